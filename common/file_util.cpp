@@ -1,0 +1,177 @@
+#include "common/file_util.h"
+
+#include <fcntl.h>
+#include <limits.h>
+#include <stdlib.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cctype>
+#include <cerrno>
+#include <memory>
+
+#include <kova/fs.h>
+#include <kova/user.h>
+
+#include "common/log.h"
+#include "common/mutex.h"
+#include "common/sdk_mutex.h"
+#include "common/unique_fd.h"
+
+namespace ferrox {
+
+namespace {
+
+constexpr size_t kPathBufferBytes = 4096;
+constexpr int kLinkHopsMax = 40;  // as the kernel's own limit: links may point at each other
+constexpr char kPackageUser[] = "Ferrox";
+
+bool MVFileImpl(const std::string& src, const std::string& dst, const KOVAFileCopyOptions& options, int flag) {
+  return KOVAFileCopy(src.c_str(), dst.c_str(), &options, flag) == 0;
+}
+
+bool WriteAll(int fd, std::string_view content) {
+  while (!content.empty()) {
+    const ssize_t written = write(fd, content.data(), content.size());
+    if (written < 0 && errno == EINTR) continue;
+    if (written < 0) return false;
+    content.remove_prefix(static_cast<size_t>(written));
+  }
+  return true;
+}
+
+bool SyncFolderOf(const std::string& path) {
+  const UniqueFd folder(open(Dirname(path).c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+  return folder.Valid() && fsync(folder.Get()) == 0;
+}
+
+/// Writes `content` to the new file at `path` and makes it durable.
+bool WriteNewFile(const std::string& path, std::string_view content, mode_t mode) {
+  const UniqueFd file(open(path.c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC | O_NOFOLLOW, mode));
+  return file.Valid() && WriteAll(file.Get(), content) && fchmod(file.Get(), mode) == 0 && fsync(file.Get()) == 0;
+}
+
+}  // namespace
+
+bool IsFileExist(const std::string& path) {
+  struct stat status = {};
+  return lstat(path.c_str(), &status) == 0 && S_ISREG(status.st_mode);
+}
+
+bool IsDirExist(const std::string& path, bool follow) {
+  std::string current = path;
+  for (int hop = 0; hop <= kLinkHopsMax; ++hop) {
+    struct stat status = {};
+    if (lstat(current.c_str(), &status) != 0) return false;
+    if (S_ISDIR(status.st_mode)) return true;
+    if (!follow || !S_ISLNK(status.st_mode)) return false;
+    char target[kPathBufferBytes] = {};
+    if (readlink(current.c_str(), target, sizeof(target) - 1) < 0) return false;
+    current = target;
+  }
+  return false;
+}
+
+bool IsDirentDir(const dirent& entry, const std::string& /*path*/) { return entry.d_type == DT_DIR; }
+
+bool CheckACLPerm(const std::string& path, int perm) {
+  const int mask = KOVAACLPermGet(path.c_str());
+  return mask >= 0 && (mask & perm) != 0;
+}
+
+bool IsMountPoint(const std::string& path) { return KOVAFSDirIsMntPoint(path.c_str()) > 0; }
+
+bool StringStartWith(const std::string& text, const std::string& prefix) {
+  return text.compare(0, prefix.size(), prefix) == 0;
+}
+
+std::string Basename(const std::string& path) {
+  const size_t slash = path.rfind('/');
+  return slash == std::string::npos ? path : path.substr(slash + 1);
+}
+
+std::string Dirname(const std::string& path) {
+  const size_t slash = path.rfind('/');
+  return slash == std::string::npos ? path : path.substr(0, slash);
+}
+
+std::string GetFileExtension(const std::string& path, bool lower) {
+  const std::string base = Basename(path);
+  const size_t dot = base.rfind('.');
+  if (dot == std::string::npos) return {};
+  std::string extension = base.substr(dot + 1);
+  if (lower) {
+    std::transform(extension.begin(), extension.end(), extension.begin(),
+                   [](unsigned char c) { return c < 0x80 ? static_cast<char>(tolower(c)) : static_cast<char>(c); });
+  }
+  return extension;
+}
+
+std::string RealPath(const std::string& path) {
+  char resolved[PATH_MAX];
+  return realpath(path.c_str(), resolved) != nullptr ? resolved : std::string();
+}
+
+bool Unlink(const std::string& path) { return unlink(path.c_str()) == 0 || errno == ENOENT; }
+
+bool MVFile(const std::string& src, const std::string& dst) {
+  KOVAFileCopyOptions options = {};
+  options.words[0] = 1;
+  options.words[1] = 1;
+  return MVFileImpl(src, dst, options, 1);
+}
+
+bool CPFile(const std::string& src, const std::string& dst) {
+  KOVAFileCopyOptions options = {};
+  options.words[0] = 1;
+  return MVFileImpl(src, dst, options, 1);
+}
+
+bool ChownFerrox(const std::string& path) {
+  uid_t uid = 0;
+  gid_t gid = 0;
+  {
+    const LockMutex guard(sdk::SDKMutex());
+    KOVAUser* found = nullptr;
+    FERROX_FAIL_IF_AS(KOVAUserGet(kPackageUser, &found) < 0 || found == nullptr, "0 > KOVAUserGet(kPackageUser, &user)",
+                      Error::kChownFailed);
+    const std::unique_ptr<KOVAUser, decltype(&KOVAUserFree)> user(found, &KOVAUserFree);
+    // The home service's state is asked for and has no effect.
+    (void)KOVAServiceUserHomeIsEnabled(0, user.get());
+    uid = user->uid;
+    gid = user->gid;
+  }
+  return chown(path.c_str(), uid, gid) == 0;
+}
+
+bool WriteWholeFile(const std::string& path, std::string_view content) {
+  struct stat old = {};
+  const mode_t mode = stat(path.c_str(), &old) == 0 ? (old.st_mode & 0777) : 0644;
+  const std::string beside = path + ".new";
+  if (WriteNewFile(beside, content, mode) && rename(beside.c_str(), path.c_str()) == 0) return SyncFolderOf(path);
+  const int saved_errno = errno;
+  (void)unlink(beside.c_str());
+  errno = saved_errno;
+  return false;
+}
+
+bool ReadWholeFile(const std::string& path, std::string& content) {
+  const UniqueFd file(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK));
+  struct stat status = {};
+  if (!file.Valid() || fstat(file.Get(), &status) != 0) return false;
+  if (!S_ISREG(status.st_mode)) {
+    errno = EINVAL;
+    return false;
+  }
+  content.clear();
+  char buffer[65536];
+  for (;;) {
+    const ssize_t got = read(file.Get(), buffer, sizeof(buffer));
+    if (got < 0 && errno == EINTR) continue;
+    if (got <= 0) return got == 0;
+    content.append(buffer, static_cast<size_t>(got));
+  }
+}
+
+}  // namespace ferrox

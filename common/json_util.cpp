@@ -1,0 +1,178 @@
+#include "common/json_util.h"
+
+#include <memory>
+
+#include <json/reader.h>
+#include <json/writer.h>
+
+#include "common/error.h"
+#include "common/file_util.h"
+
+namespace ferrox {
+
+namespace {
+
+std::string Render(const Json::Value& value, const char* indentation) {
+  Json::StreamWriterBuilder builder;
+  builder["commentStyle"] = "None";
+  builder["indentation"] = indentation;
+  builder["emitUTF8"] = true;
+  return Json::writeString(builder, value);
+}
+
+std::unique_ptr<Json::CharReader> NewReader() {
+  Json::CharReaderBuilder builder;
+  builder["collectComments"] = false;
+  builder["allowComments"] = false;
+  builder["allowTrailingCommas"] = false;
+  builder["failIfExtra"] = true;
+  builder["stackLimit"] = 1000;
+  return std::unique_ptr<Json::CharReader>(builder.newCharReader());
+}
+
+/// The member of that name, or null when `object` has none.
+/// @throws Error kBadArgument when `object` is not one, or lacks a required member.
+const Json::Value* FindMember(const Json::Value& object, const std::string& key, bool required) {
+  if (!IsJsonObject(object)) throw Error(Error::kBadArgument, "Not an object" + AppendData(object));
+  const Json::Value* member = object.find(key.data(), key.data() + key.size());
+  if (member == nullptr && required) {
+    throw Error(Error::kBadArgument, "Missing property: " + key + AppendData(object));
+  }
+  return member;
+}
+
+}  // namespace
+
+bool fromString(Json::Value& value, const std::string& text) {
+  thread_local const std::unique_ptr<Json::CharReader> reader = NewReader();
+  try {
+    if (reader->parse(text.data(), text.data() + text.size(), &value, nullptr)) return true;
+  } catch (const Json::Exception&) {
+    // Nesting beyond the limit: as unreadable as any other text.
+  }
+  value = Json::Value();
+  return false;
+}
+
+std::string toString(const Json::Value& value) { return Render(value, ""); }
+
+bool fromFile(Json::Value& value, const std::string& path) {
+  std::string text;
+  if (ReadWholeFile(path, text)) return fromString(value, text);
+  value = Json::Value();
+  return false;
+}
+
+bool toFile(const Json::Value& value, const std::string& path) { return WriteWholeFile(path, toString(value) + "\n"); }
+
+template <>
+bool isJsonType<std::string>(const Json::Value& value) {
+  return value.isConvertibleTo(Json::stringValue);
+}
+template <>
+bool isJsonType<bool>(const Json::Value& value) {
+  return value.isConvertibleTo(Json::booleanValue);
+}
+template <>
+bool isJsonType<int>(const Json::Value& value) {
+  return value.isConvertibleTo(Json::intValue);
+}
+template <>
+bool isJsonType<unsigned int>(const Json::Value& value) {
+  return value.isConvertibleTo(Json::uintValue);
+}
+template <>
+bool isJsonType<long long>(const Json::Value& value) {
+  // An unsigned value beyond the signed range cannot be read as one.
+  return (value.type() == Json::intValue || value.type() == Json::uintValue) && value.isInt64();
+}
+template <>
+bool isJsonType<double>(const Json::Value& value) {
+  return value.isConvertibleTo(Json::realValue);
+}
+
+template <>
+std::string asJsonType<std::string>(const Json::Value& value) {
+  return value.asString();
+}
+template <>
+bool asJsonType<bool>(const Json::Value& value) {
+  return value.asBool();
+}
+template <>
+int asJsonType<int>(const Json::Value& value) {
+  return value.asInt();
+}
+template <>
+unsigned int asJsonType<unsigned int>(const Json::Value& value) {
+  return value.asUInt();
+}
+template <>
+long long asJsonType<long long>(const Json::Value& value) {
+  return value.asInt64();
+}
+template <>
+double asJsonType<double>(const Json::Value& value) {
+  return value.asDouble();
+}
+
+std::string AppendData(const Json::Value& value) { return ", data=" + Render(value, "\t") + "\n"; }
+
+template <typename T>
+void GetJsonValue(T& out, const Json::Value& object, const std::string& key, bool required) {
+  const Json::Value* member = FindMember(object, key, required);
+  if (member == nullptr) return;
+  if (isJsonType<T>(*member)) {
+    out = asJsonType<T>(*member);
+  } else if (required) {
+    // Deliberate: the same words for every type.
+    throw Error(Error::kBadArgument, "Not a string" + AppendData(object));
+  }
+}
+
+template void GetJsonValue(std::string&, const Json::Value&, const std::string&, bool);
+template void GetJsonValue(bool&, const Json::Value&, const std::string&, bool);
+template void GetJsonValue(int&, const Json::Value&, const std::string&, bool);
+template void GetJsonValue(unsigned int&, const Json::Value&, const std::string&, bool);
+template void GetJsonValue(long long&, const Json::Value&, const std::string&, bool);
+template void GetJsonValue(double&, const Json::Value&, const std::string&, bool);
+
+template <>
+void GetJsonValue(Json::Value& out, const Json::Value& object, const std::string& key, bool required) {
+  const Json::Value* member = FindMember(object, key, required);
+  if (member != nullptr) out = Json::Value(*member);
+}
+
+void JsonApplyChanges(Json::Value& target, const Json::Value& changes) {
+  if (!changes.isObject()) return;
+  if (!target.isObject()) target = Json::Value(Json::objectValue);
+  for (const std::string& key : changes.getMemberNames()) {
+    const Json::Value& change = changes[key];
+    if (change.isNull()) {
+      target.removeMember(key);
+    } else if (change.isObject()) {
+      JsonApplyChanges(target[key], change);
+    } else {
+      target[key] = change;
+    }
+  }
+}
+
+template <>
+Json::Value Vec2JsonArr(const std::vector<std::string>& elements) {
+  Json::Value array(Json::arrayValue);
+  for (const std::string& element : elements) array.append(element);
+  return array;
+}
+
+template <>
+std::vector<std::string> JsonArr2Vec(const Json::Value& array) {
+  std::vector<std::string> elements;
+  if (!array.isArray()) return elements;
+  for (const Json::Value& element : array) {
+    if (isJsonType<std::string>(element)) elements.push_back(asJsonType<std::string>(element));
+  }
+  return elements;
+}
+
+}  // namespace ferrox

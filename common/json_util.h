@@ -1,0 +1,98 @@
+#pragma once
+
+#include <string>
+#include <vector>
+
+#include <json/value.h>
+
+#include "common/export.h"
+
+/// Typed reading of JSON with uniform error texts, partial updates, and whole-text and whole-file conversion.
+/// No exception of the JSON library leaves any of these functions.
+namespace ferrox {
+
+/// Parses one JSON value that makes up the whole text; blanks around it are allowed, comments are not.
+/// False, with `value` null, for anything else: also for text after the value and nesting deeper than 1000.
+FERROX_EXPORT bool fromString(Json::Value& value, const std::string& text);
+/// The value as one line. UTF-8, and any other byte, stays as it is.
+FERROX_EXPORT std::string toString(const Json::Value& value);
+/// Reads a JSON file; false, with `value` null, when it cannot be read or parsed.
+FERROX_EXPORT bool fromFile(Json::Value& value, const std::string& path);
+/// Writes a JSON file as one line, the old file or the new one at any moment; false, with errno set, on failure.
+FERROX_EXPORT bool toFile(const Json::Value& value, const std::string& path);
+
+/// Whether `value` is an object; a null value counts as an empty one.
+inline bool IsJsonObject(const Json::Value& value) { return value.isObject() || value.isNull(); }
+/// Whether `value` is an array; a null value counts as an empty one.
+inline bool IsJsonArray(const Json::Value& value) { return value.isArray() || value.isNull(); }
+
+/// Whether `value` can be read as a `T`, and the reading. For std::string, bool, int, unsigned int, long long, double.
+/// long long takes integers only, the others whatever the JSON library converts without loss of range.
+template <typename T>
+bool isJsonType(const Json::Value& value);
+/// Call only where isJsonType holds.
+template <typename T>
+T asJsonType(const Json::Value& value);
+
+/// ", data=" and the value in the JSON library's styled form, for error texts.
+FERROX_EXPORT std::string AppendData(const Json::Value& value);
+
+/// Reads the member `key` of `object` into `out`; for the types above and Json::Value (of any type). A null `object`
+/// counts as empty. An optional member that is missing or of another type leaves `out` as it was.
+/// @throws Error kBadArgument, with the whole object in its text: "Not an object"; for a required member
+/// "Missing property: <key>" or, whatever `T` is, "Not a string". `out` is then as it was.
+template <typename T>
+void GetJsonValue(T& out, const Json::Value& object, const std::string& key, bool required);
+
+/// Merges the object `changes` into `target`: null removes a member, an object merges key by key to any depth (and
+/// replaces what is no object), anything else replaces. What is not an object changes nothing.
+FERROX_EXPORT void JsonApplyChanges(Json::Value& target, const Json::Value& changes);
+
+/// An array of the elements in order, never null. For std::string.
+template <typename T>
+Json::Value Vec2JsonArr(const std::vector<T>& elements);
+/// The elements of an array that can be read as `T`, in order. For std::string.
+template <typename T>
+std::vector<T> JsonArr2Vec(const Json::Value& array);
+
+template <>
+FERROX_EXPORT bool isJsonType<std::string>(const Json::Value& value);
+template <>
+FERROX_EXPORT bool isJsonType<bool>(const Json::Value& value);
+template <>
+FERROX_EXPORT bool isJsonType<int>(const Json::Value& value);
+template <>
+FERROX_EXPORT bool isJsonType<unsigned int>(const Json::Value& value);
+template <>
+FERROX_EXPORT bool isJsonType<long long>(const Json::Value& value);
+template <>
+FERROX_EXPORT bool isJsonType<double>(const Json::Value& value);
+
+template <>
+FERROX_EXPORT std::string asJsonType<std::string>(const Json::Value& value);
+template <>
+FERROX_EXPORT bool asJsonType<bool>(const Json::Value& value);
+template <>
+FERROX_EXPORT int asJsonType<int>(const Json::Value& value);
+template <>
+FERROX_EXPORT unsigned int asJsonType<unsigned int>(const Json::Value& value);
+template <>
+FERROX_EXPORT long long asJsonType<long long>(const Json::Value& value);
+template <>
+FERROX_EXPORT double asJsonType<double>(const Json::Value& value);
+
+extern template FERROX_EXPORT void GetJsonValue(std::string&, const Json::Value&, const std::string&, bool);
+extern template FERROX_EXPORT void GetJsonValue(bool&, const Json::Value&, const std::string&, bool);
+extern template FERROX_EXPORT void GetJsonValue(int&, const Json::Value&, const std::string&, bool);
+extern template FERROX_EXPORT void GetJsonValue(unsigned int&, const Json::Value&, const std::string&, bool);
+extern template FERROX_EXPORT void GetJsonValue(long long&, const Json::Value&, const std::string&, bool);
+extern template FERROX_EXPORT void GetJsonValue(double&, const Json::Value&, const std::string&, bool);
+template <>
+FERROX_EXPORT void GetJsonValue(Json::Value& out, const Json::Value& object, const std::string& key, bool required);
+
+template <>
+FERROX_EXPORT Json::Value Vec2JsonArr(const std::vector<std::string>& elements);
+template <>
+FERROX_EXPORT std::vector<std::string> JsonArr2Vec(const Json::Value& array);
+
+}  // namespace ferrox

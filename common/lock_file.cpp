@@ -1,0 +1,70 @@
+#include "common/lock_file.h"
+
+#include <fcntl.h>
+#include <sys/file.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <chrono>
+#include <cstdlib>
+
+#include "common/clock.h"
+#include "common/log.h"
+
+namespace ferrox {
+
+namespace {
+
+constexpr int kAttempts = 64;
+// O_NONBLOCK: a FIFO at the path must not hold the opener.
+constexpr int kOpenFlags = O_RDONLY | O_CREAT | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK;
+
+bool IsRegular(int fd) {
+  struct stat opened = {};
+  return fstat(fd, &opened) == 0 && S_ISREG(opened.st_mode);
+}
+
+/// Whether `path` still names the open file: a queue's file may be renamed away before its lock is had.
+bool IsStillAt(int fd, const std::string& path) {
+  struct stat opened = {};
+  struct stat named = {};
+  return fstat(fd, &opened) == 0 && lstat(path.c_str(), &named) == 0 && opened.st_dev == named.st_dev &&
+         opened.st_ino == named.st_ino;
+}
+
+void WaitForNextAttempt() { Clock::Get().SleepFor(std::chrono::milliseconds(100 * (rand() % 10))); }
+
+}  // namespace
+
+LockFile::LockFile(const std::string& path, bool exclusive) : path_(path) {
+  for (int attempt = 0; attempt < kAttempts; ++attempt) {
+    fd_ = open(path_.c_str(), kOpenFlags, 0644);
+    FERROX_FAIL_IF_AS(0 > fd_, "0 > (fd_ = open(path_.c_str(), O_RDONLY | O_CREAT, 0644))", Error::kLockFailed,
+                      "open failed, path=" + path_ + ", reason=" + ErrnoText());
+    if (!IsRegular(fd_)) {
+      (void)close(fd_);
+      throw Error(Error::kLockFailed, "open failed, path=" + path_ + ", reason=not a regular file");
+    }
+    const bool locked = flock(fd_, (exclusive ? LOCK_EX : LOCK_SH) | LOCK_NB) == 0;
+    if (locked && IsStillAt(fd_, path_)) return;
+    const int lock_errno = errno;
+    (void)close(fd_);
+    fd_ = -1;
+    if (!locked && lock_errno != EINTR && lock_errno != EAGAIN) {
+      errno = lock_errno;
+      throw Error(Error::kLockFailed, ErrnoText());
+    }
+    // A renamed file frees its path at once; only a held lock is worth waiting for.
+    if (!locked) WaitForNextAttempt();
+  }
+  throw Error(Error::kLockFailed, "Exceed max retry, path=" + path_);
+}
+
+LockFile::~LockFile() {
+  if (fd_ < 0) return;
+  (void)flock(fd_, LOCK_UN);
+  (void)close(fd_);
+}
+
+}  // namespace ferrox

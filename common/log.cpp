@@ -1,0 +1,84 @@
+#include "common/log.h"
+
+#include <syslog.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <atomic>
+#include <cerrno>
+#include <cstdarg>
+#include <cstdio>
+#include <cstring>
+#include <string_view>
+
+namespace ferrox {
+
+namespace {
+
+constexpr size_t kLineMaxBytes = 8192;
+
+void SystemSink(int priority, const char* line) { syslog(priority, "%s", line); }
+
+std::atomic<LogSink> g_sink{&SystemSink};
+
+std::string WithoutControlCharacters(std::string_view text) {
+  std::string out;
+  out.reserve(text.size());
+  for (const char c : text) {
+    const auto byte = static_cast<unsigned char>(c);
+    if (byte >= 0x20 && byte != 0x7f) {
+      out += c;
+    } else {
+      char escaped[5];
+      (void)snprintf(escaped, sizeof(escaped), "\\x%02x", static_cast<unsigned>(byte));
+      out += escaped;
+    }
+  }
+  return out;
+}
+
+}  // namespace
+
+void Log(int priority, const char* format, ...) {
+  const int saved_errno = errno;
+  char line[kLineMaxBytes];
+  va_list arguments;
+  va_start(arguments, format);
+  const int length = vsnprintf(line, sizeof(line), format, arguments);
+  va_end(arguments);
+  const size_t used = length < 0 ? 0 : std::min(static_cast<size_t>(length), sizeof(line) - 1);
+  g_sink.load()(priority, WithoutControlCharacters({line, used}).c_str());
+  errno = saved_errno;
+}
+
+LogSink SetLogSink(LogSink sink) { return g_sink.exchange(sink != nullptr ? sink : &SystemSink); }
+
+std::string ModuleName(const char* file) {
+  const char* slash = strrchr(file, '/');
+  const char* start = slash != nullptr ? slash + 1 : file;
+  return {start, strcspn(start, ".")};
+}
+
+void LogFailure(const FailSite& site, int saved_errno, const std::string& reason) {
+  const std::string module = ModuleName(site.file);
+  errno = saved_errno;
+  if (saved_errno != 0) {
+    Log(LOG_ERR, "%s:%d (%d, %u) (%s) Failed [%s], reason: %s [err: %m]", module.c_str(), site.line, getpid(),
+        geteuid(), site.function, site.condition, reason.c_str());
+  } else {
+    Log(LOG_ERR, "%s:%d (%d, %u) (%s) Failed [%s], reason: %s", module.c_str(), site.line, getpid(), geteuid(),
+        site.function, site.condition, reason.c_str());
+  }
+}
+
+void Fail(const FailSite& site, int saved_errno, Error::ErrorCode code, const std::string& reason) {
+  LogFailure(site, saved_errno, reason);
+  throw Error(code, reason);
+}
+
+std::string ErrnoText() {
+  char buffer[256];
+  return strerror_r(errno, buffer, sizeof(buffer));
+}
+
+}  // namespace ferrox

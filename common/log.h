@@ -1,0 +1,60 @@
+#pragma once
+
+#include <string>
+
+#include "common/error.h"
+#include "common/export.h"
+
+namespace ferrox {
+
+/// Takes one finished line of the log; `priority` is one of syslog's.
+using LogSink = void (*)(int priority, const char* line);
+
+/// Writes one line to the log, the system's unless SetLogSink chose another. `%m` stands for errno's text. Control
+/// characters are written as \xNN, so that no file name can forge a line; a line is cut at 8 KiB. Keeps errno.
+FERROX_EXPORT void Log(int priority, const char* format, ...) __attribute__((format(printf, 2, 3)));
+
+/// Replaces the log's sink for the whole process and returns the one before; null restores the system's.
+FERROX_EXPORT LogSink SetLogSink(LogSink sink);
+
+/// Where a failure was noticed: `file` is the source's path or its module's name, `condition` the failed check as text.
+struct FailSite {
+  const char* file;
+  int line;
+  const char* function;
+  const char* condition;
+};
+
+/// The name of the module that `file` belongs to: its stem.
+FERROX_EXPORT std::string ModuleName(const char* file);
+
+/// Logs "<module>:<line> (<pid>, <euid>) (<function>) Failed [<condition>], reason: <reason>" and, when `saved_errno`
+/// is not 0, " [err: <its text>]". errno is `saved_errno` afterwards.
+FERROX_EXPORT void LogFailure(const FailSite& site, int saved_errno, const std::string& reason = {});
+/// LogFailure, then throws Error(code, reason).
+[[noreturn, gnu::cold]] FERROX_EXPORT void Fail(const FailSite& site, int saved_errno, Error::ErrorCode code,
+                                                const std::string& reason = {});
+
+/// The text of the present errno.
+FERROX_EXPORT std::string ErrnoText();
+
+}  // namespace ferrox
+
+/// The name under which this source logs. A module that is cut into several files sets it before its includes.
+#ifndef FERROX_SOURCE
+#define FERROX_SOURCE __FILE__
+#endif
+
+/// Logs the failure line for `condition` and throws Error(code, reason...) when it holds. The line shows `text`, for
+/// conditions that the log names otherwise than the source does.
+#define FERROX_FAIL_IF_AS(condition, text, code, ...)                                                                 \
+  do {                                                                                                                \
+    if (condition) [[unlikely]] {                                                                                     \
+      const int ferrox_saved_errno = errno;                                                                           \
+      ::ferrox::Fail({FERROX_SOURCE, __LINE__, __func__, text}, ferrox_saved_errno, code __VA_OPT__(, ) __VA_ARGS__); \
+    }                                                                                                                 \
+  } while (false)
+
+/// The same, with the condition as it stands in the source. Not for use inside a lambda, whose name is no help in a
+/// log.
+#define FERROX_FAIL_IF(condition, code, ...) FERROX_FAIL_IF_AS(condition, #condition, code __VA_OPT__(, ) __VA_ARGS__)

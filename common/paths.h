@@ -1,0 +1,26 @@
+#pragma once
+
+#include <string>
+
+#include "common/export.h"
+
+namespace ferrox {
+
+/// Where a fixed absolute path of the product lies in this instance: the path itself, or below the instance's root.
+FERROX_EXPORT std::string InstancePath(const char* fixed_path);
+
+/// The longest path that a socket of this host can have, in bytes.
+constexpr size_t kSocketPathMaxBytes = 107;
+
+/// Why this instance's root cannot be used: a sentence with the remedy. Empty when it can.
+FERROX_EXPORT std::string InstanceRootProblem();
+
+inline constexpr char kFileIndexdSocket[] = "/var/run/fileindexd.sock";
+inline constexpr char kElasticdSocket[] = "/var/run/kovaelasticd.sock";
+inline constexpr char kConfigurationFolder[] = "/var/packages/Ferrox/etc";
+inline constexpr char kFileIndexFoldersCfgPath[] = "/var/packages/Ferrox/etc/fileindex.folders";
+inline constexpr char kFileIndexStatusCfgPath[] = "/var/packages/Ferrox/etc/fileindex.status";
+inline constexpr char kFolderLockPath[] = "/tmp/ferrox_cfg_folder.lock";
+inline constexpr char kStatusLockPath[] = "/tmp/ferrox_cfg_fi_status.lock";
+
+}  // namespace ferrox

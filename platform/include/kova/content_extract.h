@@ -1,0 +1,21 @@
+#pragma once
+
+#include <string>
+
+#include <json/forwards.h>
+
+namespace KOVA::CONTENT_EXTRACT {
+
+/// Fills `document` with the metadata fields of the file or folder at `path` (absolute): always the fields known from
+/// the path and from `lstat` (path, parent, name, display name, kind, extension, is-directory, sizes, dates, owner,
+/// content type), and, when `config["need_meta"]` is true, what the content tells (text, title, encoding).
+/// Values have the types of the index schema; a field that is not known is absent.
+///
+/// Two members beside the schema's serve the index daemon: "_KOVAStamp" (string; changes when size, mtime, ctime or
+/// inode does) and, when the content could not be read, "_KOVAExtractError" (string; the reason). Such a file still
+/// yields the document of its name. Reads at most 1 MiB of text; blocks for the reading of one file. May be called by
+/// several threads at once.
+/// @throws std::runtime_error when `path` does not exist or cannot be examined at all.
+void ParseFile(const std::string& path, const Json::Value& config, Json::Value& document);
+
+}  // namespace KOVA::CONTENT_EXTRACT

@@ -1,0 +1,21 @@
+#pragma once
+
+#include <stdlib.h>
+
+#include <string>
+
+namespace kova {
+
+/// The folder that this instance's fixed paths lie under: the value of FERROX_ROOT, without trailing slashes; empty for
+/// the one instance of the host itself. Read once; ignored in a program with raised privileges.
+inline const std::string& InstanceRoot() {
+  static const std::string root = [] {
+    const char* value = secure_getenv("FERROX_ROOT");
+    std::string text = value != nullptr ? value : "";
+    while (!text.empty() && text.back() == '/') text.pop_back();
+    return text;
+  }();
+  return root;
+}
+
+}  // namespace kova

@@ -1,0 +1,34 @@
+#pragma once
+
+#include <sys/types.h>
+
+#include <string>
+
+#include "common/export.h"
+
+namespace ferrox::sdk {
+
+/// Remembers the process's effective user and group and gives them back when the scope ends. The identity is that of
+/// the whole process, not of one thread: keep the scope short.
+class FERROX_EXPORT SDKCredentials {
+ public:
+  /// Remembers only. @throws Error kCredentialsFailed when the present user is unknown to the platform.
+  SDKCredentials();
+  /// Remembers, then AsUser(user).
+  explicit SDKCredentials(const std::string& user);
+  SDKCredentials(const SDKCredentials&) = delete;
+  SDKCredentials& operator=(const SDKCredentials&) = delete;
+  /// Restores the identity if it has changed. @throws Error kCredentialsFailed when that fails: going on under a
+  /// foreign identity would be worse.
+  ~SDKCredentials() noexcept(false);
+
+  /// Becomes `user`, or "root" when `user` is an administrator. @throws Error kCredentialsFailed.
+  void AsUser(const std::string& user);
+
+ private:
+  uid_t uid_;
+  gid_t gid_;
+  std::string username_;
+};
+
+}  // namespace ferrox::sdk

@@ -1,0 +1,60 @@
+#pragma once
+
+#include <cstdint>
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "common/export.h"
+
+struct KOVAShare;
+
+namespace ferrox::sdk {
+
+/// One shared folder as the platform knows it. Made per use; holds the platform's record while it lives. Every platform
+/// call is made under SDKMutex() unless a function says otherwise, so its caller must not hold that mutex.
+class FERROX_EXPORT SDKShare {
+ public:
+  /// @throws Error kNoSuchShare, with the name, when there is no such share.
+  explicit SDKShare(const std::string& share_name);
+  SDKShare(const SDKShare&) = delete;
+  SDKShare& operator=(const SDKShare&) = delete;
+  ~SDKShare();
+
+  const std::string& GetName() const { return share_name_; }
+  /// The share's absolute folder, for example "/volume1/photo".
+  std::string GetPath() const;
+
+  /// The share's index id, database folder and event queue file, as the platform composes them.
+  /// @throws Error kInternal "<platform call> failed, share=<name>".
+  std::string GetDBName() const;
+  std::string GetDBPath() const;
+  std::string GetQueuePath() const;
+
+  /// True only for a platform value of exactly 1. @throws Error kInternal.
+  bool IsEnableRecycleBin() const;
+  bool IsEncryption() const;
+  /// Whether the share is neither locked (encrypted) nor read-only; both are always asked. @throws Error kInternal.
+  bool CanBeIndexed() const;
+  /// Whether 100 MiB more fit on the share's volume. Deliberate: a query that fails for any reason but lack of space
+  /// counts as enough, so that it cannot stop indexing.
+  bool IsSpaceEnough() const;
+  /// False when the query fails. Made without the mutex, like GetPrivilege.
+  bool IsHideUnReadable() const;
+  /// The platform's privilege value of `user` on this share (KOVA_PRIV_*), as it is.
+  int GetPrivilege(const std::string& user) const;
+  uint32_t GetFTPPrivilege() const;
+
+  /// The names of all shares. @throws Error kShareEnumFailed.
+  static std::vector<std::string> Enum();
+
+ private:
+  struct RecordFree {
+    void operator()(KOVAShare* record) const;
+  };
+
+  std::unique_ptr<KOVAShare, RecordFree> share_info_;
+  std::string share_name_;
+};
+
+}  // namespace ferrox::sdk

@@ -1,0 +1,82 @@
+#include "services/support/daemon.h"
+
+#include <fcntl.h>
+#include <signal.h>
+#include <sys/file.h>
+#include <sys/signalfd.h>
+#include <sys/socket.h>
+#include <sys/stat.h>
+#include <sys/un.h>
+#include <syslog.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstdlib>
+#include <cstring>
+
+#include "common/file_util.h"
+#include "common/log.h"
+#include "common/paths.h"
+
+namespace ferrox::services {
+
+namespace {
+
+UniqueFd BlockSignals() {
+  (void)signal(SIGPIPE, SIG_IGN);
+  sigset_t set;
+  (void)sigemptyset(&set);
+  for (const int number : {SIGTERM, SIGINT}) (void)sigaddset(&set, number);
+  (void)pthread_sigmask(SIG_BLOCK, &set, nullptr);
+  (void)signal(SIGHUP, SIG_IGN);
+  return UniqueFd(signalfd(-1, &set, SFD_CLOEXEC | SFD_NONBLOCK));
+}
+
+/// The pid file of a running process is locked by it; what is written in it is only for people.
+UniqueFd TakePidFile(const std::string& path, const std::string& name) {
+  UniqueFd file(open(path.c_str(), O_RDWR | O_CREAT | O_CLOEXEC | O_NOFOLLOW, 0644));
+  FERROX_FAIL_IF(!file.Valid(), Error::kInternal, "cannot open " + path + ": " + ErrnoText());
+  FERROX_FAIL_IF(flock(file.Get(), LOCK_EX | LOCK_NB) != 0, Error::kInternal,
+                 name + " runs already in this instance (" + path + " is locked); stop it first");
+  const std::string text = std::to_string(getpid()) + "\n";
+  const bool written =
+      ftruncate(file.Get(), 0) == 0 && write(file.Get(), text.data(), text.size()) == static_cast<ssize_t>(text.size());
+  FERROX_FAIL_IF(!written, Error::kInternal, "cannot write " + path + ": " + ErrnoText());
+  return file;
+}
+
+}  // namespace
+
+bool MakeFolders(const std::string& path, mode_t mode) {
+  if (path.empty() || mkdir(path.c_str(), mode) == 0 || errno == EEXIST) return true;
+  return errno == ENOENT && MakeFolders(Dirname(path), mode) && (mkdir(path.c_str(), mode) == 0 || errno == EEXIST);
+}
+
+Daemon::Daemon(const std::string& name) : name_(name) {
+  openlog(name_.c_str(), LOG_PID | (InstancePath("").empty() ? 0 : LOG_PERROR), LOG_DAEMON);
+  const std::string problem = InstanceRootProblem();
+  FERROX_FAIL_IF(!problem.empty(), Error::kInternal, problem);
+  for (const char* folder : {"/var/run", "/tmp", kConfigurationFolder}) {
+    FERROX_FAIL_IF(!MakeFolders(InstancePath(folder)), Error::kInternal,
+                   "cannot make " + InstancePath(folder) + ": " + ErrnoText());
+  }
+  stop_fd_ = BlockSignals();
+  FERROX_FAIL_IF(!stop_fd_.Valid(), Error::kInternal, "signalfd: " + ErrnoText());
+  pid_file_ = TakePidFile(InstancePath(("/var/run/" + name_ + ".pid").c_str()), name_);
+}
+
+void Daemon::NotifyReady() {
+  const char* address = getenv("NOTIFY_SOCKET");
+  sockaddr_un target = {};
+  if (address == nullptr || strlen(address) >= sizeof(target.sun_path)) return;
+  target.sun_family = AF_UNIX;
+  memcpy(target.sun_path, address, strlen(address));
+  if (target.sun_path[0] == '@') target.sun_path[0] = '\0';
+  const UniqueFd sender(socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
+  const char ready[] = "READY=1";
+  const auto length = static_cast<socklen_t>(offsetof(sockaddr_un, sun_path) + strlen(address));
+  (void)sendto(sender.Get(), ready, sizeof(ready) - 1, MSG_NOSIGNAL, reinterpret_cast<const sockaddr*>(&target),
+               length);
+}
+
+}  // namespace ferrox::services

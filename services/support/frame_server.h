@@ -1,0 +1,61 @@
+#pragma once
+
+#include <sys/types.h>
+
+#include <chrono>
+#include <cstdint>
+#include <functional>
+#include <memory>
+#include <string>
+
+#include "common/unique_fd.h"
+
+namespace ferrox::services {
+
+/// Who asks, as the kernel knows it.
+struct Peer {
+  uid_t uid = 0;
+  gid_t gid = 0;
+  pid_t pid = 0;
+};
+
+struct FrameServerOptions {
+  std::string socket_path;
+  mode_t socket_mode = 0600;
+  /// The largest request, in bytes; a longer one ends its connection.
+  uint32_t request_limit_bytes = 1U << 20;
+  /// The bytes of all requests being received at one time; beyond it the connection that wants more is ended.
+  uint64_t receiving_limit_bytes = 256U << 20;
+  unsigned connections_max = 256;
+  unsigned workers = 4;
+  /// A connection that neither sends nor takes a byte for so long is ended.
+  std::chrono::seconds idle_timeout{60};
+};
+
+/// Serves requests and replies on a Unix-domain socket, each a 4-byte length in host byte order and that many bytes. A
+/// connection may carry several requests, one after the other. A peer that is silent, slow, announces too much or
+/// leaves early costs its own connection and nothing else.
+class FrameServer {
+ public:
+  /// Answers one request; called on one of the workers. An exception ends that connection alone.
+  using Handler = std::function<std::string(const std::string& request, const Peer& peer)>;
+
+  /// Binds and listens. A socket file left by a dead process is replaced; one that answers is not.
+  /// @throws Error kInternal, with the path and what to do, when the socket cannot be had.
+  FrameServer(FrameServerOptions options, Handler handler);
+  FrameServer(const FrameServer&) = delete;
+  FrameServer& operator=(const FrameServer&) = delete;
+  /// Stops, waits for the requests being answered, and removes the socket file.
+  ~FrameServer();
+
+  /// Serves until Stop() or until `stop_fd` (-1: none) becomes readable; returns after the last reply.
+  void Run(int stop_fd);
+  /// Ends Run; from any thread or a signal handler.
+  void Stop();
+
+ private:
+  class Impl;
+  std::unique_ptr<Impl> impl_;
+};
+
+}  // namespace ferrox::services
