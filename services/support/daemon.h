@@ -7,8 +7,8 @@
 namespace ferrox::services {
 
 /// What every daemon does at its start, in this order: refuses an unusable instance root, makes the instance's runtime
-/// folders, opens the log (standard error too in an instance), turns SIGTERM and SIGINT into StopFd, ignores SIGHUP and SIGPIPE,
-/// and takes the pid file, whose lock lasts as long as the process.
+/// folders, opens the log (standard error too in an instance), turns SIGTERM and SIGINT into StopFd, ignores SIGHUP and
+/// SIGPIPE, and takes the pid file, whose lock lasts as long as the process.
 class Daemon {
  public:
   /// @throws Error kInternal with a sentence when the root is unusable or another process already has the pid file.

@@ -24,8 +24,8 @@ struct FrameServerOptions {
   mode_t socket_mode = 0600;
   /// The largest request, in bytes; a longer one ends its connection.
   uint32_t request_limit_bytes = 1U << 20;
-  /// The bytes of all requests being received at one time; beyond it the connection that wants more is ended.
-  uint64_t receiving_limit_bytes = 256U << 20;
+  /// The bytes of all requests not yet answered; beyond it the connection that sends more is ended.
+  uint64_t requests_limit_bytes = 256U << 20;
   unsigned connections_max = 256;
   unsigned workers = 4;
   /// A connection that neither sends nor takes a byte for so long is ended.
