@@ -1,5 +1,7 @@
 #pragma once
 
+#include <sys/stat.h>
+
 #include <string>
 
 #include <json/forwards.h>
@@ -17,5 +19,9 @@ namespace KOVA::CONTENT_EXTRACT {
 /// several threads at once.
 /// @throws std::runtime_error when `path` does not exist or cannot be examined at all.
 void ParseFile(const std::string& path, const Json::Value& config, Json::Value& document);
+
+/// The "_KOVAStamp" that ParseFile gives a file whose `lstat` is `status`: a short text without control characters.
+/// It changes when size, mtime (with nanoseconds), ctime or inode does, and does not depend on the path.
+std::string Stamp(const struct stat& status);
 
 }  // namespace KOVA::CONTENT_EXTRACT
