@@ -1,0 +1,132 @@
+#include "platform/base/frames.h"
+
+#include <poll.h>
+#include <sys/socket.h>
+#include <sys/un.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <cstring>
+
+#include "platform/base/failure.h"
+
+namespace kova {
+
+namespace {
+
+constexpr size_t kReceiveStepBytes = 64 * 1024;
+
+/// Waits until the socket can be read or written; `timeout_ms` -1 waits for ever. A closed peer counts as ready.
+bool WaitFor(int fd, short events, int timeout_ms) {
+  pollfd state = {fd, events, 0};
+  int ready;
+  do {
+    ready = poll(&state, 1, timeout_ms);
+  } while (ready < 0 && errno == EINTR);
+  if (ready == 0) errno = ETIMEDOUT;
+  return ready > 0;
+}
+
+bool SendAll(int fd, const char* data, size_t size, int idle_timeout_ms) {
+  while (size > 0) {
+    const ssize_t sent = send(fd, data, size, MSG_NOSIGNAL | MSG_DONTWAIT);
+    if (sent > 0) {
+      data += sent;
+      size -= static_cast<size_t>(sent);
+    } else if (sent < 0 && errno == EAGAIN) {
+      if (!WaitFor(fd, POLLOUT, idle_timeout_ms)) return false;
+    } else if (sent == 0 || errno != EINTR) {
+      return false;
+    }
+  }
+  return true;
+}
+
+bool RecvAll(int fd, char* data, size_t size) {
+  while (size > 0) {
+    const ssize_t got = recv(fd, data, size, 0);
+    if (got > 0) {
+      data += got;
+      size -= static_cast<size_t>(got);
+    } else if (got < 0 && errno == EAGAIN) {
+      if (!WaitFor(fd, POLLIN, -1)) return false;
+    } else if (got == 0 || errno != EINTR) {
+      return false;
+    }
+  }
+  return true;
+}
+
+/// A connect that a signal interrupts goes on by itself; its outcome is told by SO_ERROR.
+bool FinishConnect(int fd) {
+  if (!WaitFor(fd, POLLOUT, -1)) return false;
+  int error = 0;
+  socklen_t size = sizeof(error);
+  if (getsockopt(fd, SOL_SOCKET, SO_ERROR, &error, &size) != 0) return false;
+  errno = error;
+  return error == 0;
+}
+
+bool Fail() {
+  (void)KOVA_FAIL(KOVA_ERR_SYSTEM);
+  return false;
+}
+
+}  // namespace
+
+int ConnectUnixSocket(const std::string& path) {
+  sockaddr_un address = {};
+  address.sun_family = AF_UNIX;
+  if (path.empty() || path.size() >= sizeof(address.sun_path)) {
+    errno = ENAMETOOLONG;
+    return KOVA_FAIL(KOVA_ERR_BAD_PARAMETER);
+  }
+  memcpy(address.sun_path, path.c_str(), path.size() + 1);
+  const int fd = socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0);
+  if (fd < 0) return KOVA_FAIL_ERRNO();
+  const bool connected = connect(fd, reinterpret_cast<const sockaddr*>(&address), sizeof(address)) == 0 ||
+                         (errno == EINTR && FinishConnect(fd));
+  if (connected) return fd;
+  (void)KOVA_FAIL(KOVA_ERR_SYSTEM);
+  const int saved_errno = errno;
+  (void)close(fd);
+  errno = saved_errno;
+  return -1;
+}
+
+bool SendFrame(int fd, const std::string& message, uint32_t limit_bytes, int idle_timeout_ms) {
+  if (message.size() > limit_bytes) {
+    errno = EMSGSIZE;
+    return Fail();
+  }
+  const auto length = static_cast<uint32_t>(message.size());
+  char header[sizeof(length)];
+  memcpy(header, &length, sizeof(length));
+  const bool sent = SendAll(fd, header, sizeof(header), idle_timeout_ms) &&
+                    SendAll(fd, message.data(), message.size(), idle_timeout_ms);
+  return sent || Fail();
+}
+
+bool RecvFrame(int fd, std::string& message, uint32_t limit_bytes) {
+  message.clear();
+  uint32_t length = 0;
+  char header[sizeof(length)];
+  errno = 0;
+  if (!RecvAll(fd, header, sizeof(header))) return Fail();
+  memcpy(&length, header, sizeof(length));
+  if (length > limit_bytes) {
+    errno = EMSGSIZE;
+    return Fail();
+  }
+  while (message.size() < length) {
+    const size_t have = message.size();
+    message.resize(have + std::min(length - have, std::max(kReceiveStepBytes, have)));
+    if (RecvAll(fd, message.data() + have, message.size() - have)) continue;
+    message.clear();
+    return Fail();
+  }
+  return true;
+}
+
+}  // namespace kova

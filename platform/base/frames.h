@@ -1,0 +1,19 @@
+#pragma once
+
+#include <cstdint>
+#include <string>
+
+/// Whole messages over a connected socket: a 4-byte length in host byte order, then that many bytes.
+namespace kova {
+
+/// A stream socket connected to the Unix-domain socket at `path`, or -1 with the failure recorded.
+int ConnectUnixSocket(const std::string& path);
+
+/// Sends one message; false when it is over the limit, the peer is gone, or it takes nothing for `idle_timeout_ms`.
+bool SendFrame(int fd, const std::string& message, uint32_t limit_bytes, int idle_timeout_ms);
+
+/// Receives one message; waits for as long as the peer does. False when the peer closes early, or announces more than
+/// the limit. Memory grows with the bytes that have come, not with the length that was announced.
+bool RecvFrame(int fd, std::string& message, uint32_t limit_bytes);
+
+}  // namespace kova
