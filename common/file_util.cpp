@@ -7,7 +7,6 @@
 #include <unistd.h>
 
 #include <algorithm>
-#include <cctype>
 #include <cerrno>
 #include <memory>
 
@@ -27,10 +26,6 @@ constexpr size_t kPathBufferBytes = 4096;
 constexpr int kLinkHopsMax = 40;  // as the kernel's own limit: links may point at each other
 constexpr char kPackageUser[] = "Ferrox";
 
-bool MVFileImpl(const std::string& src, const std::string& dst, const KOVAFileCopyOptions& options, int flag) {
-  return KOVAFileCopy(src.c_str(), dst.c_str(), &options, flag) == 0;
-}
-
 bool WriteAll(int fd, std::string_view content) {
   while (!content.empty()) {
     const ssize_t written = write(fd, content.data(), content.size());
@@ -42,14 +37,19 @@ bool WriteAll(int fd, std::string_view content) {
 }
 
 bool SyncFolderOf(const std::string& path) {
-  const UniqueFd folder(open(Dirname(path).c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+  const size_t slash = path.rfind('/');
+  const std::string name = slash == std::string::npos ? "." : path.substr(0, slash + 1);
+  const UniqueFd folder(open(name.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
   return folder.Valid() && fsync(folder.Get()) == 0;
 }
 
-/// Writes `content` to the new file at `path` and makes it durable.
-bool WriteNewFile(const std::string& path, std::string_view content, mode_t mode) {
-  const UniqueFd file(open(path.c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC | O_NOFOLLOW, mode));
-  return file.Valid() && WriteAll(file.Get(), content) && fchmod(file.Get(), mode) == 0 && fsync(file.Get()) == 0;
+/// Writes `content` to the file at `path`, which is to replace `old` (null: there is none), and makes it durable.
+bool WriteNewFile(const std::string& path, std::string_view content, const struct stat* old) {
+  const UniqueFd file(open(path.c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC | O_NOFOLLOW, 0600));
+  if (!file.Valid()) return false;
+  if (old != nullptr && fchown(file.Get(), old->st_uid, old->st_gid) != 0 && errno != EPERM) return false;
+  const mode_t mode = old != nullptr ? (old->st_mode & 0777) : 0644;
+  return fchmod(file.Get(), mode) == 0 && WriteAll(file.Get(), content) && fsync(file.Get()) == 0;
 }
 
 }  // namespace
@@ -101,10 +101,7 @@ std::string GetFileExtension(const std::string& path, bool lower) {
   const size_t dot = base.rfind('.');
   if (dot == std::string::npos) return {};
   std::string extension = base.substr(dot + 1);
-  if (lower) {
-    std::transform(extension.begin(), extension.end(), extension.begin(),
-                   [](unsigned char c) { return c < 0x80 ? static_cast<char>(tolower(c)) : static_cast<char>(c); });
-  }
+  if (lower) std::transform(extension.begin(), extension.end(), extension.begin(), ToLowerAscii);
   return extension;
 }
 
@@ -114,6 +111,10 @@ std::string RealPath(const std::string& path) {
 }
 
 bool Unlink(const std::string& path) { return unlink(path.c_str()) == 0 || errno == ENOENT; }
+
+bool MVFileImpl(const std::string& src, const std::string& dst, const KOVAFileCopyOptions& options, int flag) {
+  return KOVAFileCopy(src.c_str(), dst.c_str(), &options, flag) == 0;
+}
 
 bool MVFile(const std::string& src, const std::string& dst) {
   KOVAFileCopyOptions options = {};
@@ -147,9 +148,10 @@ bool ChownFerrox(const std::string& path) {
 
 bool WriteWholeFile(const std::string& path, std::string_view content) {
   struct stat old = {};
-  const mode_t mode = stat(path.c_str(), &old) == 0 ? (old.st_mode & 0777) : 0644;
+  const bool exists = stat(path.c_str(), &old) == 0;
   const std::string beside = path + ".new";
-  if (WriteNewFile(beside, content, mode) && rename(beside.c_str(), path.c_str()) == 0) return SyncFolderOf(path);
+  if (WriteNewFile(beside, content, exists ? &old : nullptr) && rename(beside.c_str(), path.c_str()) == 0)
+    return SyncFolderOf(path);
   const int saved_errno = errno;
   (void)unlink(beside.c_str());
   errno = saved_errno;

@@ -7,6 +7,8 @@
 
 #include "common/export.h"
 
+struct KOVAFileCopyOptions;
+
 /// Paths and files. Nothing here throws unless it says so: failure is false or an empty text.
 namespace ferrox {
 
@@ -44,6 +46,12 @@ FERROX_EXPORT std::string RealPath(const std::string& path);
 /// Removes a file; true when it is gone afterwards, also when it was missing before.
 FERROX_EXPORT bool Unlink(const std::string& path);
 
+/// A-Z to a-z, whatever the locale; any other byte stays.
+inline char ToLowerAscii(char c) { return c >= 'A' && c <= 'Z' ? static_cast<char>(c - 'A' + 'a') : c; }
+
+/// The platform's copy of a file; true on success.
+FERROX_EXPORT bool MVFileImpl(const std::string& src, const std::string& dst, const KOVAFileCopyOptions& options,
+                              int flag);
 /// Move or copy a file through the platform; true on success.
 FERROX_EXPORT bool MVFile(const std::string& src, const std::string& dst);
 FERROX_EXPORT bool CPFile(const std::string& src, const std::string& dst);
@@ -53,8 +61,10 @@ FERROX_EXPORT bool CPFile(const std::string& src, const std::string& dst);
 FERROX_EXPORT bool ChownFerrox(const std::string& path);
 
 /// Replaces the whole content of `path`, so that a crash at any moment leaves the old or the new content: a file beside
-/// it is written, synced and renamed over it, and the folder synced. The mode is that of the old file, else 0644.
-/// False, with errno set and the old content in place, when anything fails.
+/// it is written, synced and renamed over it, and the folder synced. Mode and owner are those of the old file (the
+/// owner as far as the caller may), else 0644 and the caller. Callers exclude each other: all writers of a path share
+/// the file beside it. False, with errno set, when anything fails; the old content is then in place, unless it was only
+/// the folder that could not be synced.
 FERROX_EXPORT bool WriteWholeFile(const std::string& path, std::string_view content);
 
 /// Reads the whole content of a regular file; false, with errno set, when it cannot be read.

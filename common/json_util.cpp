@@ -1,12 +1,13 @@
 #include "common/json_util.h"
 
+#include <cerrno>
 #include <memory>
 
 #include <json/reader.h>
 #include <json/writer.h>
 
-#include "common/error.h"
 #include "common/file_util.h"
+#include "common/log.h"
 
 namespace ferrox {
 
@@ -30,13 +31,17 @@ std::unique_ptr<Json::CharReader> NewReader() {
   return std::unique_ptr<Json::CharReader>(builder.newCharReader());
 }
 
+[[noreturn]] void FailReading(const char* condition, int line, const std::string& reason, const Json::Value& object) {
+  Fail({FERROX_SOURCE, line, "GetJsonValue", condition}, errno, Error::kBadArgument, reason + AppendData(object));
+}
+
 /// The member of that name, or null when `object` has none.
 /// @throws Error kBadArgument when `object` is not one, or lacks a required member.
 const Json::Value* FindMember(const Json::Value& object, const std::string& key, bool required) {
-  if (!IsJsonObject(object)) throw Error(Error::kBadArgument, "Not an object" + AppendData(object));
+  if (!IsJsonObject(object)) FailReading("!obj.isObject()", __LINE__, "Not an object", object);
   const Json::Value* member = object.find(key.data(), key.data() + key.size());
   if (member == nullptr && required) {
-    throw Error(Error::kBadArgument, "Missing property: " + key + AppendData(object));
+    FailReading("!obj.isMember(key)", __LINE__, "Missing property: " + key, object);
   }
   return member;
 }
@@ -126,7 +131,7 @@ void GetJsonValue(T& out, const Json::Value& object, const std::string& key, boo
     out = asJsonType<T>(*member);
   } else if (required) {
     // Deliberate: the same words for every type.
-    throw Error(Error::kBadArgument, "Not a string" + AppendData(object));
+    FailReading("!isJsonType<T>(obj[key])", __LINE__, "Not a string", object);
   }
 }
 

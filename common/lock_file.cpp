@@ -18,7 +18,13 @@ namespace {
 
 constexpr int kAttempts = 64;
 // O_NONBLOCK: a FIFO at the path must not hold the opener.
-constexpr int kOpenFlags = O_RDONLY | O_CREAT | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK;
+constexpr int kOpenFlags = O_RDONLY | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK;
+
+/// Opens the file, made only when missing: in a sticky folder the kernel refuses O_CREAT on another user's file.
+int OpenLockFile(const std::string& path) {
+  const int fd = open(path.c_str(), kOpenFlags);
+  return fd >= 0 || errno != ENOENT ? fd : open(path.c_str(), kOpenFlags | O_CREAT, 0644);
+}
 
 bool IsRegular(int fd) {
   struct stat opened = {};
@@ -39,12 +45,14 @@ void WaitForNextAttempt() { Clock::Get().SleepFor(std::chrono::milliseconds(100 
 
 LockFile::LockFile(const std::string& path, bool exclusive) : path_(path) {
   for (int attempt = 0; attempt < kAttempts; ++attempt) {
-    fd_ = open(path_.c_str(), kOpenFlags, 0644);
+    fd_ = OpenLockFile(path_);
     FERROX_FAIL_IF_AS(0 > fd_, "0 > (fd_ = open(path_.c_str(), O_RDONLY | O_CREAT, 0644))", Error::kLockFailed,
                       "open failed, path=" + path_ + ", reason=" + ErrnoText());
     if (!IsRegular(fd_)) {
       (void)close(fd_);
-      throw Error(Error::kLockFailed, "open failed, path=" + path_ + ", reason=not a regular file");
+      errno = 0;
+      FERROX_FAIL_IF_AS(true, "!S_ISREG(opened.st_mode)", Error::kLockFailed,
+                        "open failed, path=" + path_ + ", reason=not a regular file");
     }
     const bool locked = flock(fd_, (exclusive ? LOCK_EX : LOCK_SH) | LOCK_NB) == 0;
     if (locked && IsStillAt(fd_, path_)) return;
@@ -58,7 +66,7 @@ LockFile::LockFile(const std::string& path, bool exclusive) : path_(path) {
     // A renamed file frees its path at once; only a held lock is worth waiting for.
     if (!locked) WaitForNextAttempt();
   }
-  throw Error(Error::kLockFailed, "Exceed max retry, path=" + path_);
+  FERROX_FAIL_IF_AS(true, "kAttempts <= attempt", Error::kLockFailed, "Exceed max retry, path=" + path_);
 }
 
 LockFile::~LockFile() {

@@ -62,19 +62,17 @@ std::string ModuleName(const char* file) {
 void LogFailure(const FailSite& site, int saved_errno, const std::string& reason) {
   const std::string module = ModuleName(site.file);
   errno = saved_errno;
-  if (saved_errno != 0) {
-    Log(LOG_ERR, "%s:%d (%d, %u) (%s) Failed [%s], reason: %s [err: %m]", module.c_str(), site.line, getpid(),
-        geteuid(), site.function, site.condition, reason.c_str());
-  } else {
-    Log(LOG_ERR, "%s:%d (%d, %u) (%s) Failed [%s], reason: %s", module.c_str(), site.line, getpid(), geteuid(),
-        site.function, site.condition, reason.c_str());
-  }
+  Log(LOG_ERR, "%s:%d (%d, %u) (%s) Failed [%s], reason: %s%s", module.c_str(), site.line, getpid(), geteuid(),
+      site.function, site.condition, reason.c_str(), ErrnoSuffix().c_str());
+  errno = saved_errno;
 }
 
 void Fail(const FailSite& site, int saved_errno, Error::ErrorCode code, const std::string& reason) {
   LogFailure(site, saved_errno, reason);
   throw Error(code, reason);
 }
+
+std::string ErrnoSuffix() { return errno == 0 ? std::string() : " [err: " + ErrnoText() + "]"; }
 
 std::string ErrnoText() {
   char buffer[256];

@@ -35,6 +35,8 @@ FERROX_EXPORT void LogFailure(const FailSite& site, int saved_errno, const std::
 [[noreturn, gnu::cold]] FERROX_EXPORT void Fail(const FailSite& site, int saved_errno, Error::ErrorCode code,
                                                 const std::string& reason = {});
 
+/// " [err: <text of the present errno>]", "" when it is 0: the end of a line that reports a failure.
+FERROX_EXPORT std::string ErrnoSuffix();
 /// The text of the present errno.
 FERROX_EXPORT std::string ErrnoText();
 

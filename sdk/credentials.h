@@ -19,7 +19,7 @@ class FERROX_EXPORT SDKCredentials {
   SDKCredentials(const SDKCredentials&) = delete;
   SDKCredentials& operator=(const SDKCredentials&) = delete;
   /// Restores the identity if it has changed. @throws Error kCredentialsFailed when that fails: going on under a
-  /// foreign identity would be worse.
+  /// foreign identity would be worse. Only logs while another exception is leaving the scope.
   ~SDKCredentials() noexcept(false);
 
   /// Becomes `user`, or "root" when `user` is an administrator. @throws Error kCredentialsFailed.
@@ -29,6 +29,7 @@ class FERROX_EXPORT SDKCredentials {
   uid_t uid_;
   gid_t gid_;
   std::string username_;
+  int exceptions_in_flight_;
 };
 
 }  // namespace ferrox::sdk

@@ -1,0 +1,117 @@
+#include "fileindex/util.h"
+
+#include <algorithm>
+#include <cerrno>
+
+#include <kova/fs.h>
+#include <kova/recycle.h>
+#include <kova/share.h>
+
+#include "common/log.h"
+#include "common/sdk_mutex.h"
+#include "sdk/share.h"
+
+namespace ferrox::fileindex {
+
+namespace {
+
+constexpr size_t kShareNameBytes = 492;
+constexpr size_t kPathBytes = 4096;
+constexpr int kEveryKindOfUser = 11;
+constexpr int kNeverIndexedFS = KOVA_FS_PSEUDO;
+
+const std::vector<std::string>& SystemPreservedNames() {
+  static const std::vector<std::string> names = {".TemporaryItems", ".KOVAPPSDB", ".DS_Store"};
+  return names;
+}
+
+bool Contains(const std::string& text, const char* part) { return text.find(part) != std::string::npos; }
+
+bool IsInSnapshot(const std::string& full_path) {
+  int in_snapshot = 0;
+  return Contains(full_path, "#snapshot") && KLIBFhsPathInSnapshot(full_path.c_str(), &in_snapshot) == 0 &&
+         in_snapshot == 1;
+}
+
+bool IsOnIndexableFS(const std::string& full_path) {
+  const int type = KOVAGetFSType(full_path.c_str(), 0);
+  return type >= 0 && KOVAFSIsRemoteFS(type) == 0 && KOVAFSIsImageFS(type) == 0 && type != kNeverIndexedFS;
+}
+
+bool IsForeignMountPoint(const std::string& full_path, const sdk::SDKShare& share) {
+  // An encrypted share is a mount of its own.
+  return KOVAFSDirIsMntPoint(full_path.c_str()) == 1 && !share.IsEncryption();
+}
+
+}  // namespace
+
+void GetShareNameByPath(std::string& share_name, const std::string& share_path) {
+  FERROX_FAIL_IF(1 > share_path.size() || '/' != share_path.at(0), Error::kBadArgument);
+  // find's npos, too, makes a length that substr cuts to the end.
+  share_name = share_path.substr(1, share_path.find('/', 1) - 1);
+}
+
+std::string GetShareNameByPath(const std::string& share_path) {
+  std::string share_name;
+  GetShareNameByPath(share_name, share_path);
+  return share_name;
+}
+
+void GetFullPath(std::string& full_path, const std::string& share_path) {
+  const sdk::SDKShare share(GetShareNameByPath(share_path));
+  full_path = Dirname(share.GetPath()) + share_path;
+}
+
+std::string GetFullPath(const std::string& share_path) {
+  std::string full_path;
+  GetFullPath(full_path, share_path);
+  return full_path;
+}
+
+void GetShareNamePathByFullPath(std::string& share_name, std::string& share_path, const std::string& full_path) {
+  char name[kShareNameBytes] = {};
+  char path[kPathBytes] = {};
+  {
+    const LockMutex guard(sdk::SDKMutex());
+    FERROX_FAIL_IF(0 > KOVAShareNamePathGet(full_path.c_str(), name, sizeof(name), path, sizeof(path)),
+                   Error::kInternal, "KOVAShareNamePathGet failed, full_path=" + full_path);
+  }
+  share_name = name;
+  share_path = path;
+}
+
+std::string ReplacePathShare(const std::string& path, const std::string& new_share, const std::string& old_share) {
+  using std::string;
+  const size_t pos = (path + "/").find("/" + old_share + "/");
+  FERROX_FAIL_IF(string::npos == pos, Error::kBadArgument, "Cannot find share: " + old_share);
+  return path.substr(0, pos + 1) + new_share + path.substr(std::min(pos + 1 + old_share.size(), path.size()));
+}
+
+bool IsFullPathInRecycleBin(const std::string& full_path) {
+  std::string share_name;
+  std::string share_path;
+  GetShareNamePathByFullPath(share_name, share_path, full_path);
+  const LockMutex guard(sdk::SDKMutex());
+  if (Contains(full_path, "#recycle") && KOVAShareIsShareRecycle(full_path.c_str()) == 1) return true;
+  return share_name == "homes" && KOVARecycleUserHomePathIsExist(full_path.c_str(), kEveryKindOfUser) == 1;
+}
+
+bool CanFullPathBeIndexed(const std::string& full_path) {
+  if (IsInSnapshot(full_path) || !IsOnIndexableFS(full_path)) return false;
+  std::string share_name;
+  std::string share_path;
+  GetShareNamePathByFullPath(share_name, share_path, full_path);
+  const sdk::SDKShare share(share_name);
+  if (!share.CanBeIndexed() || IsFullPathInRecycleBin(full_path) || IsForeignMountPoint(full_path, share)) return false;
+  return !full_path.empty() && RealPath(full_path) == full_path;
+}
+
+bool CanPathBeIndexed(const std::string& share_path) { return CanFullPathBeIndexed(GetFullPath(share_path)); }
+
+bool IsSystemPreservedFileName(const std::string& file_name) {
+  if (KOVAEAIsHiddenDir(file_name.c_str()) == 1) return true;
+  const std::vector<std::string>& names = SystemPreservedNames();
+  return std::find(names.begin(), names.end(), file_name) != names.end();
+}
+
+}  // namespace ferrox::fileindex
