@@ -8,6 +8,7 @@ int KOVAFSIsRemoteFS(int type) {
     case KOVA_FS_CIFS:
     case KOVA_FS_CEPH:
     case KOVA_FS_FUSE_REMOTE:
+    case KOVA_FS_OTHER_REMOTE:
       return 1;
     default:
       return 0;

@@ -10,6 +10,7 @@ extern "C" {
 enum {
   KOVA_ERR_NONE = 0,
   KOVA_ERR_BAD_PARAMETER = 0x0D00,
+  KOVA_ERR_BAD_CONFIGURATION = 0x0E00,  ///< the share table or the configuration cannot be used
   KOVA_ERR_NO_SUCH_SHARE = 0x1400,
   KOVA_ERR_NO_SUCH_USER = 0x1D00,
   KOVA_ERR_OUT_OF_SPACE = 0x2400,   ///< the file system is full

@@ -28,6 +28,7 @@ enum {
   KOVA_FS_CIFS = 33,
   KOVA_FS_CEPH = 34,
   KOVA_FS_FUSE_REMOTE = 35,
+  KOVA_FS_OTHER_REMOTE = 36,
   KOVA_FS_ISO9660 = 64,
   KOVA_FS_UDF = 65,
   KOVA_FS_SQUASHFS = 66,
@@ -40,7 +41,8 @@ int KOVAGetFSType(const char* path, int follow_mount);
 int KOVAFSIsRemoteFS(int type);
 /// 1 for a type that is a mounted image, else 0.
 int KOVAFSIsImageFS(int type);
-/// 1 when `path` is a directory on which something is mounted, 0 when not, below 0 when it cannot be asked.
+/// 1 when `path` is a directory on which something is mounted, 0 when not, below 0 when it cannot be asked. A share's
+/// own folder never counts: a whole volume, or a bind mount, may well be a share.
 int KOVAFSDirIsMntPoint(const char* path);
 
 /// Whether `path` lies in a snapshot, confirmed by the file system. 0 with `*in_snapshot` 1 or 0; below 0 on failure.

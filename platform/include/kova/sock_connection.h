@@ -6,7 +6,7 @@
 namespace kovadaemon {
 
 /// A stream socket that carries whole messages: a 4-byte length in host byte order, then that many bytes.
-class SockConnection {
+class __attribute__((visibility("default"))) SockConnection {
  public:
   SockConnection() = default;
   SockConnection(const SockConnection&) = delete;
@@ -32,7 +32,7 @@ class SockConnection {
 };
 
 /// The same over a Unix-domain socket.
-class DomainSockConnection : public SockConnection {
+class __attribute__((visibility("default"))) DomainSockConnection : public SockConnection {
  public:
   explicit DomainSockConnection(const std::string& socket_path) : socket_path_(socket_path) {}
   bool Connect() override;

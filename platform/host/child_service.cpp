@@ -1,0 +1,204 @@
+#include "platform/host/child_service.h"
+
+#include <fcntl.h>
+#include <poll.h>
+#include <signal.h>
+#include <sys/file.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <chrono>
+#include <cstdlib>
+#include <cstring>
+#include <fstream>
+
+#include <kova/instance.h>
+
+#include "platform/base/failure.h"
+#include "platform/base/frames.h"
+#include "platform/host/detached_process.h"
+#include "platform/host/files.h"
+
+namespace kova::host {
+
+namespace {
+
+using SteadyClock = std::chrono::steady_clock;
+
+constexpr std::chrono::seconds kStartMax{10};
+constexpr std::chrono::seconds kStopMax{20};
+constexpr std::chrono::seconds kKillMax{2};
+constexpr std::chrono::seconds kOthersMax{35};  // another process that starts or stops the same service
+constexpr int kPollMs = 10;
+
+thread_local std::string t_problem;
+
+std::string PidPath(const ServiceRow& service) { return InstanceRoot() + "/var/run/" + service.program + ".pid"; }
+
+pid_t ReadPid(int fd) {
+  char text[32] = {};
+  if (pread(fd, text, sizeof(text) - 1, 0) <= 0) return 0;
+  const long pid = strtol(text, nullptr, 10);
+  return pid > 0 ? static_cast<pid_t>(pid) : 0;
+}
+
+/// The process that holds the service's pid file, or 0. The lock is only tried when the written process exists, so that
+/// looking does not get in the way of a daemon that is just taking it.
+pid_t RunningPid(const ServiceRow& service) {
+  const Fd file(open(PidPath(service).c_str(), O_RDONLY | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK));
+  if (!file.Valid()) return 0;
+  const pid_t pid = ReadPid(file.Get());
+  if (pid == 0 || (kill(pid, 0) != 0 && errno == ESRCH)) return 0;
+  return flock(file.Get(), LOCK_SH | LOCK_NB) != 0 && errno == EWOULDBLOCK ? pid : 0;
+}
+
+bool Answers(const ServiceRow& service) {
+  if (service.socket == nullptr) return true;
+  const Fd connection(ConnectUnixSocket(InstanceRoot() + service.socket));
+  return connection.Valid();
+}
+
+std::string FindProgram(const std::string& program) {
+  std::string folders[4];
+  const char* given = secure_getenv("FERROX_LIBEXEC");
+  if (given != nullptr) folders[0] = given;
+  char self[4096];
+  const ssize_t length = readlink("/proc/self/exe", self, sizeof(self));
+  if (length > 0 && static_cast<size_t>(length) < sizeof(self)) {
+    folders[1] = FolderOf(std::string(self, static_cast<size_t>(length)));
+    folders[2] = FolderOf(folders[1]) + "/sbin";
+    folders[3] = FolderOf(folders[1]) + "/libexec";
+  }
+  for (const std::string& folder : folders) {
+    const std::string path = folder + "/" + program;
+    struct stat info = {};
+    if (!folder.empty() && stat(path.c_str(), &info) == 0 && S_ISREG(info.st_mode) && access(path.c_str(), X_OK) == 0) {
+      return path;
+    }
+  }
+  return {};
+}
+
+/// The last line of a text file that is not empty.
+std::string LastLine(const std::string& path) {
+  constexpr std::streamoff kTailBytes = 4096;
+  std::ifstream file(path, std::ios::binary | std::ios::ate);
+  const std::streamoff size = file.tellg();
+  if (size > kTailBytes) {
+    (void)file.seekg(size - kTailBytes);
+  } else {
+    (void)file.seekg(0);
+  }
+  std::string line, last;
+  while (std::getline(file, line)) {
+    if (!line.empty()) last = line;
+  }
+  return last;
+}
+
+/// Keeps other processes from starting or stopping the same service.
+class SwitchLock {
+ public:
+  explicit SwitchLock(const ServiceRow& service)
+      : file_(open((InstanceRoot() + "/var/run/" + service.program + ".switch").c_str(),
+                   O_RDWR | O_CREAT | O_CLOEXEC | O_NOFOLLOW, 0600)) {}
+
+  bool Take() {
+    const auto deadline = SteadyClock::now() + kOthersMax;
+    while (file_.Valid() && flock(file_.Get(), LOCK_EX | LOCK_NB) != 0) {
+      if ((errno != EWOULDBLOCK && errno != EINTR) || SteadyClock::now() > deadline) return false;
+      (void)poll(nullptr, 0, kPollMs);
+    }
+    return file_.Valid();
+  }
+
+ private:
+  Fd file_;
+};
+
+int Ended(const ServiceRow& service) {
+  const std::string log_path = ServiceLogPath(service.program);
+  const std::string last = LastLine(log_path);
+  return ServiceFailure(KOVA_ERR_SYSTEM, std::string(service.program) + " ended at once" +
+                                             (last.empty() ? "" : ": " + last) + " (its log is " + log_path + ")");
+}
+
+/// Waits until the service is up. `pid` is the process that was started, 0 for one that somebody else had started.
+int WaitUntilReady(const ServiceRow& service, pid_t pid) {
+  const ProcessHandle process(pid != 0 ? pid : RunningPid(service));
+  const auto deadline = SteadyClock::now() + kStartMax;
+  do {
+    if (RunningPid(service) != 0 && Answers(service)) return 0;
+    if (process.WaitForEnd(kPollMs)) return RunningPid(service) != 0 && Answers(service) ? 0 : Ended(service);
+  } while (SteadyClock::now() < deadline);
+  return ServiceFailure(KOVA_ERR_SYSTEM, std::string(service.program) + " runs but does not answer after " +
+                                             std::to_string(kStartMax.count()) + " s; see its log " +
+                                             ServiceLogPath(service.program));
+}
+
+bool WaitUntilGone(const ServiceRow& service, pid_t pid, std::chrono::seconds longest) {
+  const auto deadline = SteadyClock::now() + longest;
+  while (RunningPid(service) == pid) {
+    if (SteadyClock::now() > deadline) return false;
+    (void)poll(nullptr, 0, kPollMs);
+  }
+  return true;
+}
+
+/// Takes the lock that a start or a stop needs, and the folders it needs.
+int Prepare(const ServiceRow& service, SwitchLock& lock) {
+  if (lock.Take()) return 0;
+  return ServiceFailure(KOVA_ERR_SYSTEM, std::string(service.program) + " cannot be switched: " + InstanceRoot() +
+                                             "/var/run cannot be written, or another start or stop of it hangs");
+}
+
+}  // namespace
+
+std::string LastServiceProblem() { return t_problem; }
+
+int ServiceFailure(int code, const std::string& problem) {
+  t_problem = problem;
+  return KOVA_FAIL(code);
+}
+
+std::string ServiceLogPath(const std::string& program) { return InstanceRoot() + "/var/log/kova/" + program + ".log"; }
+
+bool IsChildServiceRunning(const ServiceRow& service) { return RunningPid(service) != 0; }
+
+int StartChildService(const ServiceRow& service) {
+  const std::string program = FindProgram(service.program);
+  if (program.empty()) {
+    return ServiceFailure(KOVA_ERR_NOT_SUPPORTED, std::string(service.program) +
+                                                      " is not installed beside this program; set FERROX_LIBEXEC to "
+                                                      "the folder that holds it");
+  }
+  (void)MakeFolders(InstanceRoot() + "/var/run", 0755);  // a failure shows as that of the lock
+  SwitchLock lock(service);
+  if (Prepare(service, lock) < 0) return -1;
+  if (RunningPid(service) != 0) return WaitUntilReady(service, 0);
+  const pid_t pid = StartDetached(program, ServiceLogPath(service.program));
+  if (pid < 0) return ServiceFailure(KOVA_ERR_SYSTEM, "cannot run " + program + ": " + strerror(errno));
+  return WaitUntilReady(service, pid);
+}
+
+int StopChildService(const ServiceRow& service) {
+  if (RunningPid(service) == 0 && access(PidPath(service).c_str(), F_OK) != 0) return 0;
+  SwitchLock lock(service);
+  if (Prepare(service, lock) < 0) return -1;
+  const pid_t pid = RunningPid(service);
+  if (pid == 0) return 0;
+  const ProcessHandle process(pid);
+  // The process is looked at again behind its handle: from here on nobody else can have its number.
+  if (RunningPid(service) != pid) return 0;
+  if (!process.Signal(SIGTERM) && errno != ESRCH) {
+    return ServiceFailure(KOVA_ERR_SYSTEM, std::string(service.program) + " (process " + std::to_string(pid) +
+                                               ") cannot be told to stop: " + strerror(errno));
+  }
+  if (WaitUntilGone(service, pid, kStopMax)) return 0;
+  (void)process.Signal(SIGKILL);
+  if (WaitUntilGone(service, pid, kKillMax)) return 0;
+  return ServiceFailure(KOVA_ERR_SYSTEM, std::string(service.program) + " does not end");
+}
+
+}  // namespace kova::host

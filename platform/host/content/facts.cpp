@@ -1,0 +1,97 @@
+#include "platform/host/content/facts.h"
+
+#include <fcntl.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <cinttypes>
+#include <cstdio>
+#include <cstring>
+#include <stdexcept>
+
+namespace kova::content {
+
+namespace {
+
+constexpr uint64_t kBlockBytes = 512;
+
+/// The text after the last "." of the name, in lower case.
+std::string ExtensionOf(const std::string& name) {
+  const size_t dot = name.rfind('.');
+  if (dot == std::string::npos) return {};
+  std::string extension = name.substr(dot + 1);
+  for (char& c : extension) {
+    if (c >= 'A' && c <= 'Z') c = static_cast<char>(c - 'A' + 'a');
+  }
+  return extension;
+}
+
+int64_t Nanoseconds(const statx_timestamp& time) { return time.tv_sec * INT64_C(1000000000) + time.tv_nsec; }
+
+/// Differs when size, content, attributes or the file itself do.
+std::string Stamp(const struct statx& info) {
+  char text[96];
+  (void)snprintf(text, sizeof(text), "%" PRIu64 ".%" PRId64 ".%" PRId64 ".%" PRIu64,
+                 static_cast<uint64_t>(info.stx_size), Nanoseconds(info.stx_mtime), Nanoseconds(info.stx_ctime),
+                 static_cast<uint64_t>(info.stx_ino));
+  return text;
+}
+
+void AddSizesAndDates(const struct statx& info, Json::Value& document) {
+  document["KOVAMDFSSize"] = static_cast<Json::UInt64>(info.stx_size);
+  document["KOVAMDLogicalSize"] = static_cast<Json::UInt64>(info.stx_size);
+  document["KOVAMDPhysicalSize"] = static_cast<Json::UInt64>(info.stx_blocks * kBlockBytes);
+  document["KOVAMDFSContentChangeDate"] = static_cast<Json::Int64>(info.stx_mtime.tv_sec);
+  document["KOVAMDContentModificationDate"] = static_cast<Json::Int64>(info.stx_mtime.tv_sec);
+  document["KOVAMDAttributeChangeDate"] = static_cast<Json::Int64>(info.stx_ctime.tv_sec);
+  if ((info.stx_mask & STATX_BTIME) != 0) {
+    document["KOVAMDFSCreationDate"] = static_cast<Json::Int64>(info.stx_btime.tv_sec);
+  }
+}
+
+}  // namespace
+
+const char* TypeByMode(unsigned mode) {
+  switch (mode & S_IFMT) {
+    case S_IFDIR:
+      return "inode/directory";
+    case S_IFLNK:
+      return "inode/symlink";
+    case S_IFIFO:
+      return "inode/fifo";
+    case S_IFSOCK:
+      return "inode/socket";
+    case S_IFCHR:
+      return "inode/chardevice";
+    case S_IFBLK:
+      return "inode/blockdevice";
+    default:
+      return nullptr;
+  }
+}
+
+Facts AddFacts(const std::string& path, Json::Value& document) {
+  Facts facts;
+  constexpr unsigned kWanted = STATX_BASIC_STATS | STATX_BTIME;
+  if (statx(AT_FDCWD, path.c_str(), AT_SYMLINK_NOFOLLOW | AT_NO_AUTOMOUNT, kWanted, &facts.info) != 0) {
+    throw std::runtime_error("cannot examine " + path + ": " + strerror(errno));
+  }
+  const size_t slash = path.rfind('/');
+  const std::string name = path.substr(slash + 1);
+  facts.extension = ExtensionOf(name);
+  document = Json::Value(Json::objectValue);
+  document["KOVAMDPath"] = path;
+  document["KOVAMDParent"] = slash == std::string::npos ? std::string() : path.substr(0, slash);
+  document["KOVAMDFSName"] = name;
+  document["KOVAMDDisplayName"] = name;
+  document["KOVAMDKind"] = facts.extension;
+  document["KOVAMDExtension"] = facts.extension;
+  document["KOVAMDIsDir"] = S_ISDIR(facts.info.stx_mode);
+  document["KOVAMDOwnerUserID"] = std::to_string(facts.info.stx_uid);
+  document["KOVAMDOwnerGroupID"] = std::to_string(facts.info.stx_gid);
+  document["_KOVAStamp"] = Stamp(facts.info);
+  AddSizesAndDates(facts.info, document);
+  return facts;
+}
+
+}  // namespace kova::content

@@ -1,0 +1,111 @@
+#include "platform/host/files.h"
+
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+#include <memory>
+#include <utility>
+
+#include <json/reader.h>
+
+namespace kova::host {
+
+namespace {
+
+constexpr off_t kJsonMaxBytes = 16 << 20;
+
+bool ReadAll(int fd, std::string& text) {
+  char buffer[16384];
+  for (;;) {
+    const ssize_t got = read(fd, buffer, sizeof(buffer));
+    if (got == 0) return true;
+    if (got < 0 && errno == EINTR) continue;
+    if (got < 0 || static_cast<off_t>(text.size()) > kJsonMaxBytes) return false;
+    text.append(buffer, static_cast<size_t>(got));
+  }
+}
+
+std::string Parse(const std::string& text, Json::Value& value) {
+  Json::CharReaderBuilder builder;
+  Json::CharReaderBuilder::strictMode(&builder.settings_);
+  builder["failIfExtra"] = true;
+  const std::unique_ptr<Json::CharReader> reader(builder.newCharReader());
+  std::string errors;
+  try {
+    if (reader->parse(text.data(), text.data() + text.size(), &value, &errors)) return {};
+  } catch (const std::exception& error) {
+    errors = error.what();
+  }
+  value = Json::Value();
+  return "is not JSON: " + errors;
+}
+
+bool SyncFolder(const std::string& path) {
+  const Fd folder(open(path.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+  return folder.Valid() && fsync(folder.Get()) == 0;
+}
+
+}  // namespace
+
+Fd::~Fd() {
+  if (fd_ >= 0) (void)close(fd_);
+}
+
+bool Fd::Close() { return close(std::exchange(fd_, -1)) == 0; }
+
+int Fd::Release() { return std::exchange(fd_, -1); }
+
+std::string FolderOf(const std::string& path) {
+  const size_t slash = path.rfind('/');
+  if (slash == std::string::npos) return ".";
+  return slash == 0 ? "/" : path.substr(0, slash);
+}
+
+std::string NameOf(const std::string& path) { return path.substr(path.rfind('/') + 1); }
+
+bool MakeFolders(const std::string& path, mode_t mode) {
+  if (path.empty() || mkdir(path.c_str(), mode) == 0 || errno == EEXIST) return true;
+  return errno == ENOENT && MakeFolders(FolderOf(path), mode) && (mkdir(path.c_str(), mode) == 0 || errno == EEXIST);
+}
+
+std::string ReadJsonFile(const std::string& path, Json::Value& value) {
+  value = Json::Value();
+  const Fd file(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK));
+  if (!file.Valid()) return errno == ENOENT ? std::string() : std::string("cannot be read: ") + strerror(errno);
+  struct stat info = {};
+  if (fstat(file.Get(), &info) != 0 || !S_ISREG(info.st_mode)) return "is not a regular file";
+  std::string text;
+  if (!ReadAll(file.Get(), text)) return "cannot be read whole";
+  return Parse(text, value);
+}
+
+bool WriteAll(int fd, const char* data, size_t size) {
+  while (size > 0) {
+    const ssize_t written = write(fd, data, size);
+    if (written < 0 && errno == EINTR) continue;
+    if (written <= 0) return false;
+    data += written;
+    size -= static_cast<size_t>(written);
+  }
+  return true;
+}
+
+bool ReplaceFile(const std::string& path, const std::string& content, mode_t mode) {
+  std::string temporary = path + ".XXXXXX";
+  Fd file(mkostemp(temporary.data(), O_CLOEXEC));
+  if (!file.Valid()) return false;
+  const bool replaced = WriteAll(file.Get(), content.data(), content.size()) && fchmod(file.Get(), mode) == 0 &&
+                        fsync(file.Get()) == 0 && file.Close() && rename(temporary.c_str(), path.c_str()) == 0;
+  if (replaced) return SyncFolder(FolderOf(path));
+  const int saved_errno = errno;
+  (void)unlink(temporary.c_str());
+  errno = saved_errno;
+  return false;
+}
+
+}  // namespace kova::host

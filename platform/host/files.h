@@ -1,0 +1,45 @@
+#pragma once
+
+#include <sys/types.h>
+
+#include <string>
+
+#include <json/value.h>
+
+namespace kova::host {
+
+/// Closes a descriptor at the end of a scope.
+class Fd {
+ public:
+  explicit Fd(int fd) : fd_(fd) {}
+  Fd(const Fd&) = delete;
+  Fd& operator=(const Fd&) = delete;
+  ~Fd();
+  int Get() const { return fd_; }
+  bool Valid() const { return fd_ >= 0; }
+  /// Closes now; false when that fails, as it may when written data cannot be stored.
+  bool Close();
+  /// Gives the descriptor away.
+  int Release();
+
+ private:
+  int fd_;
+};
+
+/// The part before the last "/" ("/" for a path directly below the root) and the part after it.
+std::string FolderOf(const std::string& path);
+std::string NameOf(const std::string& path);
+
+/// Makes a folder and those above it; true when it exists afterwards.
+bool MakeFolders(const std::string& path, mode_t mode);
+
+/// Reads a JSON file of at most 16 MiB. A missing file is an empty value and no problem. Returns what is wrong with the
+/// file, or an empty text.
+std::string ReadJsonFile(const std::string& path, Json::Value& value);
+
+/// Replaces a file whole: written beside it, synced, renamed over it, the folder synced. False, with errno, on failure.
+bool ReplaceFile(const std::string& path, const std::string& content, mode_t mode);
+
+bool WriteAll(int fd, const char* data, size_t size);
+
+}  // namespace kova::host

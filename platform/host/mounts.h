@@ -1,0 +1,14 @@
+#pragma once
+
+#include <string>
+
+namespace kova::host {
+
+/// The file-system type that the mount table gives for the mount of `path`, for example "fuse.sshfs"; empty when the
+/// table does not tell.
+std::string MountedType(const std::string& path);
+
+/// 1 when a mount begins at `path`, 0 when not, below 0 with errno. Links are not followed.
+int IsMountRoot(const std::string& path);
+
+}  // namespace kova::host

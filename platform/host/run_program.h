@@ -1,0 +1,15 @@
+#pragma once
+
+#include <string>
+#include <vector>
+
+namespace kova::host {
+
+/// Runs a program without a shell, waits for it, and returns its exit status; below 0, with the failure recorded, when
+/// it could not be started or was killed. `arguments` does not hold the program itself.
+int RunProgram(const std::string& path, const std::vector<std::string>& arguments);
+
+/// The arguments as the system takes them: pointers into `texts`, which must outlive them, and a null at the end.
+std::vector<char*> ArgumentVector(const std::vector<std::string>& texts);
+
+}  // namespace kova::host

@@ -1,0 +1,210 @@
+#include "platform/host/share_table.h"
+
+#include <fcntl.h>
+#include <sys/file.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <cstring>
+
+#include <json/value.h>
+#include <json/writer.h>
+
+#include <kova/error.h>
+#include <kova/instance.h>
+
+#include "platform/base/failure.h"
+#include "platform/host/files.h"
+#include "platform/host/share_rules.h"
+#include "platform/host/stat_cache.h"
+
+namespace kova::host {
+
+namespace {
+
+StatCache<ShareTable>& Cache() {
+  static auto* cache = new StatCache<ShareTable>;  // never freed: look-ups may come until the very end of a process
+  return *cache;
+}
+
+/// Reads a member; false when it is there with another type.
+bool Read(const Json::Value& object, const char* key, bool& out) {
+  if (!object.isMember(key)) return true;
+  if (!object[key].isBool()) return false;
+  out = object[key].asBool();
+  return true;
+}
+
+bool Read(const Json::Value& object, const char* key, std::string& out) {
+  if (!object.isMember(key)) return true;
+  if (!object[key].isString()) return false;
+  out = object[key].asString();
+  return true;
+}
+
+bool Read(const Json::Value& object, const char* key, uint32_t& out) {
+  if (!object.isMember(key)) return true;
+  if (!object[key].isUInt()) return false;
+  out = object[key].asUInt();
+  return true;
+}
+
+/// What is wrong with one element of the table; empty when it was read.
+std::string ReadEntry(const Json::Value& object, ShareEntry& entry) {
+  if (!object.isObject()) return "is not an object";
+  const bool read = Read(object, "name", entry.name) && Read(object, "path", entry.path) &&
+                    Read(object, "recycle", entry.recycle) && Read(object, "encrypted", entry.encrypted) &&
+                    Read(object, "locked", entry.locked) && Read(object, "read_only", entry.read_only) &&
+                    Read(object, "hide_unreadable", entry.hide_unreadable) &&
+                    Read(object, "ftp_privilege", entry.ftp_privilege);
+  if (!read) return "has a member of the wrong type";
+  while (entry.path.size() > 1 && entry.path.back() == '/') entry.path.pop_back();
+  const std::string problem = ShareTextProblem(entry.name, entry.path);
+  return problem.empty() ? problem : "is not valid: " + problem;
+}
+
+Json::Value ToJson(const ShareEntry& entry) {
+  const ShareEntry usual;
+  Json::Value object(Json::objectValue);
+  object["name"] = entry.name;
+  object["path"] = entry.path;
+  if (!entry.recycle.empty()) object["recycle"] = entry.recycle;
+  if (entry.encrypted) object["encrypted"] = true;
+  if (entry.locked) object["locked"] = true;
+  if (entry.read_only) object["read_only"] = true;
+  if (entry.hide_unreadable) object["hide_unreadable"] = true;
+  if (entry.ftp_privilege != usual.ftp_privilege) object["ftp_privilege"] = entry.ftp_privilege;
+  return object;
+}
+
+/// Keeps other processes from changing the table. The lock file stays.
+class TableLock {
+ public:
+  TableLock() : path_(ShareTablePath() + ".lock"), file_(Open(path_)) {
+    if (!file_.Valid()) throw ShareTableError("cannot open " + path_ + ": " + strerror(errno));
+    while (flock(file_.Get(), LOCK_EX) != 0) {
+      if (errno != EINTR) throw ShareTableError("cannot lock " + path_ + ": " + strerror(errno));
+    }
+  }
+
+ private:
+  static int Open(const std::string& path) {
+    if (!MakeFolders(FolderOf(path), 0755)) return -1;
+    return open(path.c_str(), O_RDWR | O_CREAT | O_CLOEXEC | O_NOFOLLOW, 0644);
+  }
+
+  std::string path_;
+  Fd file_;
+};
+
+std::string TableProblem(const std::string& table_path, const std::string& problem) {
+  return "the share table " + table_path + " " + problem + "; correct it, or move it away to start with an empty one";
+}
+
+/// The table as it stands in the file, checked as a whole.
+Json::Value ReadChecked() {
+  const ShareTable table = ShareTable::Load(ShareTablePath());
+  if (!table.Problem().empty()) throw ShareTableError(table.Problem());
+  Json::Value value;
+  (void)ReadJsonFile(ShareTablePath(), value);
+  return value.isNull() ? Json::Value(Json::arrayValue) : value;
+}
+
+void Write(const Json::Value& table) {
+  Json::StreamWriterBuilder builder;
+  builder["indentation"] = "  ";
+  builder["emitUTF8"] = true;
+  const bool written = ReplaceFile(ShareTablePath(), Json::writeString(builder, table) + "\n", 0644);
+  if (!written) throw ShareTableError("cannot write " + ShareTablePath() + ": " + strerror(errno));
+  Cache().Forget();
+}
+
+}  // namespace
+
+std::string ShareTablePath() { return InstanceRoot() + "/etc/kova/shares.json"; }
+
+ShareTable ShareTable::Load(const std::string& table_path) {
+  ShareTable table;
+  Json::Value value;
+  std::string problem = ReadJsonFile(table_path, value);
+  if (problem.empty() && !value.isNull() && !value.isArray()) problem = "is not an array";
+  for (Json::ArrayIndex i = 0; problem.empty() && i < value.size(); ++i) {
+    ShareEntry entry;
+    problem = ReadEntry(value[i], entry);
+    if (!problem.empty()) problem = "has an entry (number " + std::to_string(i + 1) + ") that " + problem;
+    table.entries_.push_back(std::move(entry));
+  }
+  std::sort(table.entries_.begin(), table.entries_.end(),
+            [](const ShareEntry& a, const ShareEntry& b) { return a.name < b.name; });
+  for (size_t i = 0; problem.empty() && i < table.entries_.size(); ++i) {
+    const ShareEntry& entry = table.entries_[i];
+    if (!table.by_name_.emplace(entry.name, i).second) problem = "has two shares named \"" + entry.name + "\"";
+    if (!table.by_path_.emplace(entry.path, i).second) problem = "has two shares at " + entry.path;
+  }
+  if (!problem.empty()) {
+    table = ShareTable();
+    table.problem_ = TableProblem(table_path, problem);
+  }
+  return table;
+}
+
+std::shared_ptr<const ShareTable> ShareTable::Current() {
+  std::shared_ptr<const ShareTable> table = Cache().Get(ShareTablePath(), &ShareTable::Load);
+  if (table->Problem().empty()) return table;
+  (void)KOVA_FAIL(KOVA_ERR_BAD_CONFIGURATION);
+  return nullptr;
+}
+
+const ShareEntry* ShareTable::ByName(const std::string& name) const {
+  const auto found = by_name_.find(name);
+  return found == by_name_.end() ? nullptr : &entries_[found->second];
+}
+
+const ShareEntry* ShareTable::ByFullPath(const std::string& full_path) const {
+  if (full_path.empty() || full_path.front() != '/' || by_path_.empty()) return nullptr;
+  for (std::string path = full_path; !path.empty(); path.resize(path.rfind('/'))) {
+    const auto found = by_path_.find(path);
+    if (found != by_path_.end()) return &entries_[found->second];
+  }
+  return nullptr;
+}
+
+std::vector<ShareEntry> ListShares() {
+  const std::shared_ptr<const ShareTable> table = Cache().Get(ShareTablePath(), &ShareTable::Load);
+  if (!table->Problem().empty()) throw ShareTableError(table->Problem());
+  return table->Entries();
+}
+
+void AddShare(const ShareEntry& share) {
+  std::string problem = ShareTextProblem(share.name, share.path);
+  if (problem.empty()) problem = ShareFolderProblem(share);
+  if (!problem.empty()) throw ShareTableError(problem);
+  const TableLock lock;
+  Json::Value table = ReadChecked();
+  for (const Json::Value& other : table) {
+    const std::string other_path = other["path"].asString();
+    if (other["name"].asString() == share.name) {
+      throw ShareTableError("there is a share \"" + share.name + "\" already, at " + other_path +
+                            "; remove it first, or give this folder another name");
+    }
+    if (other_path == share.path) throw ShareTableError(share.path + " is a share already; nothing to add");
+  }
+  table.append(ToJson(share));
+  Write(table);
+}
+
+void RemoveShare(const std::string& name) {
+  const TableLock lock;
+  const Json::Value table = ReadChecked();
+  Json::Value rest(Json::arrayValue);
+  for (const Json::Value& share : table) {
+    if (share["name"].asString() != name) rest.append(share);
+  }
+  if (rest.size() == table.size()) {
+    throw ShareTableError("there is no share \"" + name + "\"; the list of shares names those there are");
+  }
+  Write(rest);
+}
+
+}  // namespace kova::host

@@ -1,0 +1,71 @@
+#pragma once
+
+#include <cstdint>
+#include <memory>
+#include <stdexcept>
+#include <string>
+#include <unordered_map>
+#include <vector>
+
+/// The host's shares: the JSON array in "/etc/kova/shares.json" below the instance's root. Each element is an object:
+///   {"name": "photo", "path": "/volume1/photo", "recycle": "#recycle", "encrypted": false, "locked": false,
+///    "read_only": false, "hide_unreadable": false, "ftp_privilege": 2}
+/// "name" and "path" are required, the others are written when they differ from the values in ShareEntry. Other members
+/// are kept. A missing file is an empty table.
+namespace kova::host {
+
+struct ShareEntry {
+  std::string name;
+  /// Absolute, without links; its last component is the name, since full paths are composed of both.
+  std::string path;
+  /// The recycle bin's folder at the top of the share, for example "#recycle"; empty: no recycle bin.
+  std::string recycle = {};
+  bool encrypted = false;
+  bool locked = false;  ///< encrypted and closed now
+  bool read_only = false;
+  bool hide_unreadable = false;
+  uint32_t ftp_privilege = 2;
+};
+
+/// What is wrong, as one sentence that says what to do.
+class __attribute__((visibility("default"))) ShareTableError : public std::runtime_error {
+ public:
+  using std::runtime_error::runtime_error;
+};
+
+/// Where the table of this instance is.
+std::string ShareTablePath();
+
+/// All shares in ascending order of their names. @throws ShareTableError when the table cannot be used.
+std::vector<ShareEntry> ListShares();
+
+/// Adds a share. Shares may lie in one another: the deepest one then owns a path. Blocks while another process changes
+/// the table. @throws ShareTableError when the share is not valid, exists, or the table cannot be read or written;
+/// the table is then as it was.
+void AddShare(const ShareEntry& share);
+
+/// Takes a share out of the table; its folder stays. @throws ShareTableError when there is no such share, as above.
+void RemoveShare(const std::string& name);
+
+/// The table in memory, for the platform's own look-ups.
+class ShareTable {
+ public:
+  /// The present table, re-read when its file has changed; null, with the failure recorded, when it cannot be used.
+  static std::shared_ptr<const ShareTable> Current();
+
+  const std::vector<ShareEntry>& Entries() const { return entries_; }
+  const ShareEntry* ByName(const std::string& name) const;
+  /// The deepest share that `full_path` lies in, on whole components; null when there is none.
+  const ShareEntry* ByFullPath(const std::string& full_path) const;
+  const std::string& Problem() const { return problem_; }
+
+  static ShareTable Load(const std::string& table_path);
+
+ private:
+  std::vector<ShareEntry> entries_;
+  std::unordered_map<std::string, size_t> by_name_;
+  std::unordered_map<std::string, size_t> by_path_;
+  std::string problem_;
+};
+
+}  // namespace kova::host
