@@ -1,0 +1,68 @@
+#include "common/log.h"
+
+#include <syslog.h>
+#include <unistd.h>
+
+#include <cerrno>
+
+#include <gtest/gtest.h>
+
+#include "common/paths.h"
+#include "tests/support/log_capture.h"
+#include "tests/support/temp_dir.h"
+
+namespace ferrox {
+
+namespace {
+
+/// The failure line of this test program, but for the line number.
+std::string Prefix(const char* function) {
+  return " (" + std::to_string(getpid()) + ", " + std::to_string(geteuid()) + ") (" + function + ") ";
+}
+
+void FailWhen(bool bad_thing, int error) {
+  errno = error;
+  FERROX_FAIL_IF(bad_thing && error >= 0, Error::kInternal, "the reason");
+}
+
+}  // namespace
+
+TEST(ErrorTest, ReasonAndComposedText) {
+  const Error bare(Error::kInternal);
+  EXPECT_STREQ(bare.what(), "");
+  EXPECT_STREQ(bare.std::runtime_error::what(), "Ferrox error, code=502");
+  const Error copy = Error(Error::kBadArgument, "x");
+  EXPECT_EQ(copy.Code(), 120);
+  EXPECT_STREQ(copy.what(), "x");
+  EXPECT_STREQ(copy.std::runtime_error::what(), "Ferrox error, code=120, reason=[x]");
+  EXPECT_STREQ(Error(static_cast<Error::ErrorCode>(-7), "y").std::runtime_error::what(),
+               "Ferrox error, code=-7, reason=[y]");
+}
+
+TEST(FailTest, LogsConditionReasonAndErrnoThenThrows) {
+  const test::LogCapture log;
+  EXPECT_NO_THROW(FailWhen(false, 0));
+  EXPECT_THROW(FailWhen(true, 0), Error);
+  EXPECT_THROW(FailWhen(true, ENOENT), Error);
+  EXPECT_EQ(errno, ENOENT) << "errno is as it was at the check";
+  ASSERT_EQ(log.Lines().size(), 2U);
+  EXPECT_EQ(log.Lines()[0].rfind("log_test:", 0), 0U) << log.Lines()[0];
+  const std::string line = Prefix("FailWhen") + "Failed [bad_thing && error >= 0], reason: the reason";
+  EXPECT_EQ(log.Lines()[0].substr(log.Lines()[0].find(' ')), line);
+  EXPECT_EQ(log.Lines()[1].substr(log.Lines()[1].find(' ')), line + " [err: No such file or directory]");
+}
+
+TEST(LogTest, NoTextCanForgeALine) {
+  const test::LogCapture log;
+  Log(LOG_ERR, "name=%s", "a\nb\x1b[2J\x7f %s \xc3\xa4");
+  Log(LOG_ERR, "%s", std::string(20000, 'x').c_str());
+  EXPECT_EQ(log.Lines()[0], "name=a\\x0ab\\x1b[2J\\x7f %s \xc3\xa4");
+  EXPECT_EQ(log.Lines()[1].size(), 8191U);
+}
+
+TEST(PathsTest, FixedPathsLieBelowTheInstanceRoot) {
+  EXPECT_EQ(InstancePath("/var/run/x"), test::TestRoot() + "/var/run/x");
+  EXPECT_EQ(InstanceRootProblem(), "");
+}
+
+}  // namespace ferrox
