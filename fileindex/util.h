@@ -68,6 +68,13 @@ FERROX_EXPORT bool CanPathBeIndexed(const std::string& share_path);
 /// Whether a file of this name belongs to a system, not to a user.
 FERROX_EXPORT bool IsSystemPreservedFileName(const std::string& file_name);
 
+/// Fields of the kernel's memory report.
+inline constexpr char kMemTotal[] = "MemTotal";
+inline constexpr char kMemFree[] = "MemFree";
+inline constexpr char kCached[] = "Cached";
+inline constexpr char kSwapTotal[] = "SwapTotal";
+inline constexpr char kSwapFree[] = "SwapFree";
+
 /// Tell the administrators that the index volume is full, or that the system lacks memory. Failures are ignored.
 FERROX_EXPORT void SendZEMNotify();
 FERROX_EXPORT void NotifyLackOfMemory();

@@ -25,7 +25,7 @@ struct FakeShare {
   /// What the flag queries answer; SDKShare takes only 1 as yes.
   int recycle = 0, encryption = 0, encrypted = 0, read_only = 0, hide_unreadable = 0;
   /// KOVAShareUserPrivGet by user; KOVA_PRIV_READ_WRITE for those not named.
-  std::map<std::string, int> privileges;
+  std::map<std::string, int> privileges = {};
 };
 
 struct FakeUser {

@@ -1,0 +1,181 @@
+#include "fileindex/elastic/comm.h"
+
+#include <cerrno>
+#include <filesystem>
+#include <functional>
+
+#include <gtest/gtest.h>
+#include <json/value.h>
+
+#include "common/error.h"
+#include "common/json_util.h"
+#include "common/paths.h"
+#include "tests/support/fake_clock.h"
+#include "tests/support/fake_platform.h"
+#include "tests/support/log_capture.h"
+#include "tests/support/temp_dir.h"
+#include "tests/support/unix_server.h"
+
+namespace ferrox::fileindex::elastic {
+
+namespace {
+
+using test::FakeConnection;
+using test::FakePlatform;
+
+constexpr char kCompound[] = R"({"compound":[{"command":"a"},{"command":"b"}]})";
+
+Json::Value Parse(const std::string& text) {
+  Json::Value value;
+  EXPECT_TRUE(fromString(value, text)) << text;
+  return value;
+}
+
+class CommTest : public testing::Test {
+ protected:
+  void SetUp() override {
+    platform_.Reset();
+    test::WriteFile(socket_, "");  // the scripted connections look no further than that it is there
+  }
+  void TearDown() override { (void)std::filesystem::remove(socket_); }
+
+  /// "<code> <reason>" of what SendRequestImpl throws when the engine answers `reply`, else the reply as filled in.
+  std::string Ask(const std::string& reply, const std::string& request = "{}",
+                  FakeConnection::Fault fault = FakeConnection::kNone) {
+    Json::Value res = "left from before";
+    platform_.connections = {{reply, fault}};
+    errno = 0;
+    try {
+      SendRequestImpl(res, Parse(request));
+      return toString(res);
+    } catch (const Error& error) {
+      return std::to_string(error.Code()) + " " + error.what();
+    }
+  }
+
+  const std::string socket_ = InstancePath(kElasticdSocket);
+  FakePlatform& platform_ = FakePlatform::Get();
+  test::FakeClock clock_;
+  test::LogCapture log_;
+};
+
+}  // namespace
+
+TEST_F(CommTest, RepliesAndWhatTheyBecome) {
+  struct Row {
+    const char *reply, *outcome;
+    bool logged;
+  };
+  for (const Row& row : {
+           Row{R"({"success":true})", R"({"success":true})", false},
+           Row{R"({"data":[1],"success":true})", R"({"data":[1],"success":true})", false},
+           Row{R"({"has_fail":true,"success":true,"data":5})", R"({"data":5,"has_fail":true,"success":true})", false},
+           Row{"no json", "913 Recv failed, res=null", true},
+           Row{"", "913 Recv failed, res=null", true},
+           Row{"[1]", "913 Recv failed, res=[1]", true},
+           Row{"7", "913 Recv failed, res=7", true},
+           Row{"{}", "913 Recv failed, res={}", true},
+           Row{R"({"success":"true"})", R"(913 Recv failed, res={"success":"true"})", true},
+           Row{R"({"success":1})", R"(913 Recv failed, res={"success":1})", true},
+           Row{R"({"success":false,"error":{"code":1404,"msg":"no such index"}})",
+               "1404 Request failed, msg=no such index", false},
+           Row{R"({"success":false,"error":{"code":-3,"msg":""}})", "-3 Request failed, msg=", false},
+           Row{R"({"success":false})", "120 Missing property: code, data=null\n", true},
+           Row{R"({"success":false,"error":7})", "120 Not an object, data=7\n", true},
+           Row{R"({"success":false,"error":{"code":"x","msg":"m"}})",
+               "120 Not a string, data={\n\t\"code\" : \"x\",\n\t\"msg\" : \"m\"\n}\n", true},
+       }) {
+    SCOPED_TRACE(row.reply);
+    log_.Lines().clear();
+    EXPECT_EQ(Ask(row.reply), row.outcome);
+    EXPECT_EQ(log_.Lines().size(), row.logged ? 1U : 0U);
+  }
+  EXPECT_EQ(platform_.connected_paths.front(), socket_);
+}
+
+TEST_F(CommTest, BrokenConnectionsAreUnreachable) {
+  EXPECT_EQ(Ask("{}", "{}", FakeConnection::kConnect), "913 Connect failed");
+  EXPECT_TRUE(log_.Contains("(SendRequestImpl) Failed [!conn.Connect()], reason: Connect failed"));
+  EXPECT_EQ(Ask("{}", "{}", FakeConnection::kSend), "913 Send failed");
+  EXPECT_TRUE(log_.Contains("Failed [!conn.Send(req.toString())], reason: Send failed"));
+  EXPECT_EQ(Ask("{}", "{}", FakeConnection::kRecv), "913 Recv failed, res=null");
+  EXPECT_TRUE(
+      log_.Contains("Failed [!conn.Recv(resp_raw) || !res.fromString(resp_raw) || "
+                    "!res.isMember(\"success\") || !res[\"success\"].isBool()], reason: Recv failed"));
+  for (const std::string& line : log_.Lines()) EXPECT_EQ(line.rfind("comm:", 0), 0U) << line;
+}
+
+TEST_F(CommTest, WaitsFifteenSecondsForTheSocket) {
+  (void)std::filesystem::remove(socket_);
+  EXPECT_EQ(Ask("{}", "{}", FakeConnection::kConnect), "913 Connect failed");
+  EXPECT_EQ(clock_.sleeps, std::vector<std::chrono::milliseconds>(15, std::chrono::seconds(1)));
+  ASSERT_EQ(log_.Lines().size(), 16U);
+  for (int retry = 1; retry <= 15; ++retry) {
+    EXPECT_NE(log_.Lines()[retry - 1].find(" elastic socket is not ready, retry ... " + std::to_string(retry)),
+              std::string::npos);
+  }
+}
+
+TEST_F(CommTest, PartsOfACompoundThatFailed) {
+  const std::string head = R"({"success":true,"has_fail":true,"data":)";
+  const std::string failed = R"({"success":false,"error":{"code":5,"msg":"five"}})";
+  const std::string busy = R"({"success":false,"error":{"code":1401,"msg":"memory"}})";
+  EXPECT_EQ(Ask(head + "[" + failed + "," + busy + "]}", kCompound), "1401 memory");
+  ASSERT_EQ(log_.Lines().size(), 1U);
+  EXPECT_NE(log_.Lines()[0].find("(SendRequestImpl) Compound failed: {\"command\":\"a\"} (5) five"), std::string::npos)
+      << log_.Lines()[0];
+  // Not looked at: no has_fail, or no compound.
+  EXPECT_EQ(Ask(R"({"success":true,"has_fail":false,"data":[)" + busy + "]}", kCompound)[0], '{');
+  EXPECT_EQ(Ask(head + "[" + busy + "]}")[0], '{');
+  // More results than parts, results without a reason, and none at all.
+  for (const char* data : {"[{},{\"success\":true},null,{\"success\":false}]", "[]", "null"}) {
+    EXPECT_EQ(Ask(head + data + "}", kCompound)[0], '{') << data;
+  }
+  for (const char* data : {"5", "{}", "[5]", "[[]]", "[{\"error\":[]}]"}) {
+    EXPECT_EQ(Ask(head + data + "}", kCompound).rfind("913 Recv failed, res=", 0), 0U) << data;
+  }
+}
+
+TEST_F(CommTest, ABusyEngineIsAskedAgainAndAgain) {
+  Json::Value res;
+  for (int i = 0; i < 13; ++i) {
+    platform_.connections.push_back({R"({"success":false,"error":{"code":1400,"msg":"busy"}})"});
+  }
+  platform_.connections.push_back({R"({"success":true,"data":"done"})"});
+  SendRequest(res, Parse(R"({"command":"commit","data":{"id":"fileindex_photo"}})"));
+  EXPECT_EQ(res["data"], "done");
+  ASSERT_EQ(clock_.sleeps.size(), 13U);
+  for (const auto pause : clock_.sleeps) {
+    EXPECT_GE(pause.count(), 900000);
+    EXPECT_LE(pause.count(), 1140000);
+    EXPECT_EQ(pause.count() % 60000, 0);
+  }
+  ASSERT_EQ(log_.Lines().size(), 13U);
+  EXPECT_NE(log_.Lines()[12].find(" Retry[12] since kovaelasticd is busy. Command: commit, db: fileindex_photo"),
+            std::string::npos);
+  EXPECT_EQ(platform_.executed.size(), 1U) << "the administrators are told once";
+  EXPECT_EQ(platform_.sent.size(), 14U);
+}
+
+TEST_F(CommTest, TheNoticeComesWithTheEleventhRetry) {
+  static size_t noticed_after;
+  noticed_after = 0;
+  platform_.engine = [this](const std::string&) {
+    if (platform_.executed.empty()) ++noticed_after;
+    return clock_.sleeps.size() < 12 ? R"({"success":true,"has_fail":true,"data":[{"success":false,)"
+                                       R"("error":{"code":1401,"msg":"m"}}]})"
+                                     : R"({"success":true})";
+  };
+  SendRequest(Parse(kCompound));
+  EXPECT_EQ(noticed_after, 11U);
+  EXPECT_NE(log_.Lines()[0].find(". Command: , db: "), std::string::npos) << log_.Lines()[0];
+  EXPECT_EQ(platform_.executed[0].arguments.back(), "error:lack_of_memory");
+}
+
+TEST_F(CommTest, OtherFailuresAreNotRetried) {
+  platform_.connections = {{R"({"success":false,"error":{"code":1407,"msg":"disk"}})"}};
+  EXPECT_THROW(SendRequest(Json::Value(Json::objectValue)), Error);
+  EXPECT_TRUE(clock_.sleeps.empty());
+}
+
+}  // namespace ferrox::fileindex::elastic

@@ -1,0 +1,235 @@
+#include "fileindex/elastic/elastic_control.h"
+
+#include <filesystem>
+#include <functional>
+#include <set>
+#include <stdexcept>
+
+#include <gtest/gtest.h>
+
+#include "common/error.h"
+#include "common/json_util.h"
+#include "common/paths.h"
+#include "fileindex/elastic/fields.h"
+#include "fileindex/status_mgr.h"
+#include "tests/support/fake_clock.h"
+#include "tests/support/fake_platform.h"
+#include "tests/support/log_capture.h"
+#include "tests/support/temp_dir.h"
+
+namespace ferrox::fileindex::elastic {
+
+namespace {
+
+using test::FakePlatform;
+
+Json::Value Parse(const std::string& text) {
+  Json::Value value;
+  EXPECT_TRUE(fromString(value, text)) << text;
+  return value;
+}
+
+std::string Failure(const std::function<void()>& call) {
+  try {
+    call();
+    return {};
+  } catch (const Error& error) {
+    return std::to_string(error.Code()) + " " + error.what();
+  }
+}
+
+class ElasticControlTest : public testing::Test {
+ protected:
+  void SetUp() override {
+    platform_.Reset();
+    platform_.shares["photo"] = {"/volume1/photo"};
+    platform_.engine = [this](const std::string& request) {
+      const Json::Value command = Parse(request)["command"];
+      return command == "document_get_by_query" ? below_ : std::string(R"({"success":true})");
+    };
+    test::WriteFile(InstancePath(kElasticdSocket), "");
+    (void)std::filesystem::remove(InstancePath(kFileIndexStatusCfgPath));
+  }
+  /// The requests that the call sends, one a line.
+  std::string SentBy(const std::function<void()>& call) {
+    std::string lines;
+    platform_.sent.clear();
+    call();
+    for (const std::string& request : platform_.sent) lines += request + "\n";
+    return lines;
+  }
+
+  FakePlatform& platform_ = FakePlatform::Get();
+  std::string below_ = R"({"success":true,"data":[]})";
+  test::FakeClock clock_;
+  test::LogCapture log_;
+};
+
+}  // namespace
+
+TEST(SchemaTest, HasEveryFieldAndAttribute) {
+  EXPECT_EQ(toString(GetFileIndexSettings()), "{}");
+  EXPECT_EQ(toString(GetFileIndexEventHandler()),
+            R"({"lib_path":"/var/packages/Ferrox/target/handler/fileindex_event_handler.so"})");
+  const Json::Value mappings = GetFileIndexMappings();
+  EXPECT_EQ(mappings.size(), 3U);
+  EXPECT_EQ(mappings["property_id"], "KOVAMDPath");
+  EXPECT_EQ(toString(mappings["default"]),
+            R"({"_all":true,"analyzer":"kovastandard","required":false,"stored":true,"type":"string"})");
+  const Json::Value& properties = mappings["properties"];
+  EXPECT_EQ(properties.size(), 53U);
+  std::map<std::string, int> types, analyzers;
+  for (const Json::Value& property : properties) {
+    ++types[property.get("type", "").asString()];
+    ++analyzers[property.get("analyzer", "").asString()];
+  }
+  EXPECT_EQ(types, (std::map<std::string, int>{{"", 13}, {"bool", 1}, {"double", 1}, {"int", 22}, {"text", 16}}));
+  EXPECT_EQ(analyzers, (std::map<std::string, int>{{"", 32}, {"keyword", 13}, {"white space", 8}}));
+  EXPECT_EQ(toString(properties["KOVAMDPath"]), R"({"_all":false,"analyzer":"keyword","required":true})");
+  EXPECT_EQ(toString(properties["KOVAMDKeywords"]), "{}");
+  EXPECT_EQ(toString(properties["KOVAMDSearchFileName"]),
+            R"({"analyzer":"white space","preprocess":["tolower","ngram"],"type":"text"})");
+}
+
+TEST(FieldsTest, AreOneHundredAndThirtyDifferentNames) {
+  const std::set<std::string> names(std::begin(kFieldNames), std::end(kFieldNames));
+  EXPECT_EQ(std::size(kFieldNames), 130U);
+  EXPECT_EQ(names.size(), 130U);
+  EXPECT_STREQ(k_KOVAMDFinderLabel, "_KOVAMDFinderLabel");
+  for (const char* odd : {"KOVAMDContactKeyworlds", "KOVAMDRecodingDate", "KOVAStateOrProvince"}) {
+    EXPECT_EQ(names.count(odd), 1U) << odd;
+  }
+}
+
+TEST_F(ElasticControlTest, CommandsAndTheirRequests) {
+  EXPECT_EQ(GetFileIndexID(""), "fileindex_");
+  struct Row {
+    std::function<void()> call;
+    const char* sent;
+  };
+  std::vector<std::string> paths;
+  for (const Row& row : {
+           Row{[] { ShareIndexPause("photo"); }, R"({"command":"index_pause","data":{"id":"fileindex_photo"}})"},
+           Row{[] { ShareIndexResume("photo"); }, R"({"command":"index_resume","data":{"id":"fileindex_photo"}})"},
+           Row{[] { ShareIndexDelete("photo"); }, R"({"command":"index_delete","data":{"id":"fileindex_photo"}})"},
+           Row{[] { ShareIndexMigrate("photo", "/db"); },
+               R"({"command":"index_config_set","data":{"data":{"path":"/db"},"id":"fileindex_photo"}})"},
+           Row{[] { ShareIndexRename("photo", "pics", "/db"); },
+               R"({"command":"index_config_set","data":{"data":{"id":"fileindex_pics","path":"/db"},)"
+               R"("id":"fileindex_photo"}})"},
+           Row{[] { IndexDel("photo", "/v/p/\xff\n"); },
+               "{\"command\":\"document_del_by_id\",\"data\":{\"doc_id\":\"/v/p/"
+               "\xff\\n\",\"id\":\"fileindex_photo\"}}"},
+           Row{[] { IndexDelDir("photo", "/v/a"); },
+               R"({"command":"document_del_by_query","data":{"id":"fileindex_photo",)"
+               R"("query":{"qsl":{"prefix":{"KOVAMDPath":"/v/a/"}}}}})"},
+           Row{[&paths] { IndexGetByPrefixPath("any id", "/v/a", paths); },
+               R"({"command":"document_get_by_query","data":{"id":"any id","query":{"load_field":["KOVAMDPath"],)"
+               R"("qsl":{"prefix":{"KOVAMDPath":"/v/a/"}}}}})"},
+           Row{[] { IndexCommit("photo"); }, R"({"command":"commit","data":{"id":"fileindex_photo"}})"},
+           Row{[] {
+                 UpdateTermSuggestion("db", {"b", "a"});
+               },
+               R"({"compound":[{"command":"update_term_suggestion","data":{"db_name":"db","doc_id_field":"b"}},)"
+               R"({"command":"update_term_suggestion","data":{"db_name":"db","doc_id_field":"a"}}]})"},
+           Row{[] { UpdateTermSuggestion("db", {}); }, R"({"compound":[]})"},
+       }) {
+    EXPECT_EQ(SentBy(row.call), std::string(row.sent) + "\n");
+  }
+  const Json::Value create = Parse(SentBy([] { ShareIndexCreate("photo"); }));
+  EXPECT_EQ(create["command"], "index_create");
+  EXPECT_EQ(create["data"].getMemberNames(),
+            (Json::Value::Members{"event_handler", "id", "mappings", "path", "settings"}));
+  EXPECT_EQ(create["data"]["mappings"], GetFileIndexMappings());
+  EXPECT_EQ(Failure([] { ShareIndexCreate("nope"); }), "800 nope");
+}
+
+TEST_F(ElasticControlTest, DocumentsAreBuiltByTheExtractor) {
+  EXPECT_EQ(SentBy([] { IndexUpsert("photo", "/v/p/a.jpg", true); }),
+            R"({"command":"document_upsert_by_id","data":{"data":{"KOVAMDFSName":"a.jpg","KOVAMDIsDir":false,)"
+            R"("KOVAMDParent":"/v/p","KOVAMDPath":"/v/p/a.jpg","KOVAMDSearchFileName":"a.jpg"},)"
+            R"("doc_id":"/v/p/a.jpg","id":"fileindex_photo"}})"
+            "\n");
+  EXPECT_NE(SentBy([] { IndexAttr("photo", "/v/p/a.jpg"); }).find(R"("command":"document_set_by_id")"),
+            std::string::npos);
+  ASSERT_EQ(platform_.parsed.size(), 2U);
+  EXPECT_EQ(toString(platform_.parsed[0].second), R"({"need_meta":true})");
+  EXPECT_EQ(toString(platform_.parsed[1].second), R"({"need_meta":false})");
+  for (const auto& parse : {
+           std::function<void(Json::Value&)>([](Json::Value&) { throw std::runtime_error("gone"); }),
+           std::function<void(Json::Value&)>([](Json::Value&) { throw 7; }),
+           std::function<void(Json::Value&)>([](Json::Value& document) { document = "no object"; }),
+       }) {
+    platform_.parse_file = [&parse](const std::string&, const Json::Value&, Json::Value& d) { parse(d); };
+    EXPECT_EQ(Failure([] { IndexUpsert("photo", "/v/p/a", true); }), "914 Parse failed, path=/v/p/a");
+  }
+}
+
+TEST_F(ElasticControlTest, RenameMovesTheFolderAndAllBelow) {
+  below_ = R"({"success":true,"data":[
+      {"KOVAMDPath":"/v/p/old/a.JPG","KOVAMDFSName":"a.JPG","KOVAMDParent":"/v/p/old"},
+      {"KOVAMDPath":"/v/p/old/d/b","KOVAMDFSName":"b","KOVAMDParent":"/v/p/old/d"},
+      {"KOVAMDPath":"/odd","KOVAMDFSName":"odd","KOVAMDParent":"/"},
+      {"KOVAMDFSName":"n","KOVAMDParent":"/w/q/new"}]})";
+  const std::string sent = SentBy([] { IndexRename("photo", "/v/p/New.Dir", "/v/p/old"); });
+  const std::string set = R"({"command":"document_set_by_id","data":{"data":{)";
+  EXPECT_EQ(sent, set +
+                      R"("KOVAMDDisplayName":"New.Dir","KOVAMDExtension":"dir","KOVAMDFSName":"New.Dir",)"
+                      R"("KOVAMDKind":"dir","KOVAMDParent":"/v/p","KOVAMDPath":"/v/p/New.Dir",)"
+                      R"("KOVAMDSearchFileName":"New.Dir"},"doc_id":"/v/p/old","id":"fileindex_photo"}})"
+                      "\n"
+                      R"({"command":"document_get_by_query","data":{"id":"fileindex_photo","query":{)"
+                      R"("load_field":["KOVAMDPath","KOVAMDFSName","KOVAMDParent"],)"
+                      R"("qsl":{"prefix":{"KOVAMDPath":"/v/p/old/"}}}}})"
+                      "\n"
+                      R"({"compound":[)" +
+                      set +
+                      R"("KOVAMDParent":"/v/p/New.Dir","KOVAMDPath":"/v/p/New.Dir/a.JPG",)"
+                      R"("KOVAMDSearchFileName":"a.JPG"},"doc_id":"/v/p/old/a.JPG","id":"fileindex_photo"}},)" +
+                      set +
+                      R"("KOVAMDParent":"/v/p/New.Dir/d","KOVAMDPath":"/v/p/New.Dir/d/b",)"
+                      R"("KOVAMDSearchFileName":"b"},"doc_id":"/v/p/old/d/b","id":"fileindex_photo"}},)" +
+                      set +
+                      R"("KOVAMDParent":"/v/p/New.Dir","KOVAMDPath":"/v/p/New.Dir/odd",)"
+                      R"("KOVAMDSearchFileName":"odd"},"doc_id":"/odd","id":"fileindex_photo"}},)" +
+                      set +
+                      R"("KOVAMDParent":"/v/p/New.Dir","KOVAMDPath":"/v/p/New.Dir/n",)"
+                      R"("KOVAMDSearchFileName":"n"},"doc_id":null,"id":"fileindex_photo"}}]})"
+                      "\n");
+  below_ = R"({"success":true,"data":null})";
+  EXPECT_EQ(SentBy([] { IndexRename("photo", "/n", "/o"); }).find("{\"compound\":[]}\n") == std::string::npos, false);
+}
+
+TEST_F(ElasticControlTest, UnusableLists) {
+  const auto rename = [] { IndexRename("photo", "/n", "/o"); };
+  std::vector<std::string> paths = {"kept"};
+  const auto list = [&paths] { IndexGetByPrefixPath("id", "/o", paths); };
+  for (const char* reply : {R"({"success":true})", R"({"data":{},"success":true})", R"({"data":5,"success":true})"}) {
+    below_ = reply;
+    EXPECT_EQ(Failure(rename), std::string("916 ") + reply);
+    EXPECT_EQ(Failure(list), std::string("916 ") + reply);
+  }
+  for (const char* entry : {"5", "[]", "\"x\""}) {
+    below_ = std::string(R"({"success":true,"data":[)") + entry + "]}";
+    EXPECT_EQ(Failure(rename).rfind("120 Not an object", 0), 0U) << entry;
+    EXPECT_EQ(Failure(list).rfind("913 Recv failed, res=", 0), 0U) << entry;
+  }
+  below_ = R"({"success":true,"data":[{"KOVAMDFSName":"n"}]})";
+  EXPECT_EQ(Failure(rename).rfind("120 Missing property: KOVAMDParent", 0), 0U);
+  below_ = R"({"success":true,"data":[{"KOVAMDPath":"/o/b"},{},{"KOVAMDPath":"/o/a"},null]})";
+  EXPECT_EQ(Failure(list), "");
+  EXPECT_EQ(paths, (std::vector<std::string>{"kept", "/o/b", "/o/a"}));
+}
+
+TEST_F(ElasticControlTest, CommitTellsAFullVolumeFromOtherFailures) {
+  platform_.engine = [](const std::string&) { return R"({"success":false,"error":{"code":1407,"msg":"disk"}})"; };
+  const auto commit = [] { IndexCommit("photo"); };
+  EXPECT_EQ(Failure(commit), "1407 Request failed, msg=disk");
+  EXPECT_EQ(StatusMgr().GetShareStatus("photo"), 0);
+  platform_.failing["KOVAQuotaIsEnough"] = {KOVA_ERR_OUT_OF_SPACE};
+  EXPECT_EQ(Failure(commit), "1003 Share (photo) space not enough");
+  EXPECT_TRUE(log_.Contains("(IndexCommit) Failed [!share.IsSpaceEnough()], reason: Share (photo) space not enough"));
+  EXPECT_EQ(StatusMgr().GetShareStatus("photo"), StatusMgr::kNeedReindex);
+}
+
+}  // namespace ferrox::fileindex::elastic

@@ -1,0 +1,175 @@
+#include <unistd.h>
+
+#include <functional>
+
+#include <gtest/gtest.h>
+
+#include <kova/error.h>
+#include <kova/fs.h>
+
+#include "common/error.h"
+#include "common/sdk_mutex.h"
+#include "sdk/credentials.h"
+#include "sdk/share.h"
+#include "tests/support/fake_platform.h"
+#include "tests/support/log_capture.h"
+#include "tests/support/temp_dir.h"
+
+namespace ferrox::sdk {
+
+namespace {
+
+using test::FakePlatform;
+
+/// "<code> <reason>" of what the call throws, "" when it does not.
+std::string Failure(const std::function<void()>& call) {
+  try {
+    call();
+    return {};
+  } catch (const Error& error) {
+    return std::to_string(error.Code()) + " " + error.what();
+  }
+}
+
+class SDKTest : public testing::Test {
+ protected:
+  void SetUp() override {
+    platform_.Reset();
+    platform_.shares["photo"] = {"/volume1/photo", 1};
+  }
+  // Nothing may leave the mutex taken, on no way.
+  void TearDown() override {
+    ASSERT_TRUE(SDKMutex().TryLock());
+    (void)SDKMutex().Unlock();
+  }
+  void BecomeRoot() {
+    platform_.euid = 0;
+    platform_.egid = 0;
+    platform_.users["alice"] = {1000, 100, false, "", 0};
+    platform_.users["boss"] = {1001, 100, true, "", 0};
+  }
+
+  FakePlatform& platform_ = FakePlatform::Get();
+  test::LogCapture log_;
+};
+
+using SDKShareTest = SDKTest;
+using SDKCredentialsTest = SDKTest;
+
+}  // namespace
+
+TEST_F(SDKShareTest, TellsWhatThePlatformKnows) {
+  const SDKShare share("photo");
+  EXPECT_EQ(share.GetName(), "photo");
+  EXPECT_EQ(share.GetPath(), "/volume1/photo");
+  EXPECT_EQ(share.GetDBName(), "fileindex_photo");
+  EXPECT_EQ(share.GetDBPath().rfind(test::TestRoot(), 0), 0U);
+  EXPECT_NE(share.GetDBPath(), share.GetQueuePath());
+  EXPECT_EQ(share.GetFTPPrivilege(), 1U);
+  platform_.users["alice"] = {1000, 100, false, "", 0};
+  platform_.shares["photo"].privileges["alice"] = KOVA_PRIV_READ_ONLY;
+  EXPECT_EQ(share.GetPrivilege("alice"), KOVA_PRIV_READ_ONLY);
+  EXPECT_LT(share.GetPrivilege("nobody-of-that-name"), 0);
+  platform_.shares["music"] = {"/volume2/music"};
+  EXPECT_EQ(SDKShare::Enum(), (std::vector<std::string>{"music", "photo"}));
+}
+
+TEST_F(SDKShareTest, OnlyExactlyOneIsYes) {
+  const SDKShare share("photo");
+  test::FakeShare& fake = platform_.shares["photo"];
+  for (const int value : {0, 1, 2}) {
+    SCOPED_TRACE(value);
+    fake.recycle = fake.encryption = fake.hide_unreadable = value;
+    EXPECT_EQ(share.IsEnableRecycleBin(), value == 1);
+    EXPECT_EQ(share.IsEncryption(), value == 1);
+    EXPECT_EQ(share.IsHideUnReadable(), value == 1);
+    for (const int read_only : {0, 1, 2}) {
+      fake.encrypted = value;
+      fake.read_only = read_only;
+      EXPECT_EQ(share.CanBeIndexed(), value == 0 && read_only == 0) << read_only;
+    }
+  }
+  EXPECT_EQ(platform_.CallCount("KLIBShareIsReadOnlyGet"), 9) << "both are asked, whatever the first says";
+  platform_.failing["KLIBShareHideUnreadableGet"] = {};
+  EXPECT_FALSE(share.IsHideUnReadable());
+}
+
+TEST_F(SDKShareTest, FailuresNameTheCallAndTheShare) {
+  EXPECT_EQ(Failure([] { SDKShare missing("nope"); }), "800 nope");
+  const SDKShare share("photo");
+  struct Row {
+    const char* call;
+    std::function<void()> use;
+    const char* failure;
+  };
+  for (const Row& row : {
+           Row{"FILEIDXGetIndexID", [&] { share.GetDBName(); }, "502 FILEIDXGetIndexID failed, share=photo"},
+           Row{"FILEIDXDBPathCompose", [&] { share.GetDBPath(); }, "502 FILEIDXDBPathCompose failed, share=photo"},
+           Row{"FILEIDXQueuePathCompose", [&] { share.GetQueuePath(); },
+               "502 FILEIDXQueuePathCompose failed, share=photo"},
+           Row{"KLIBShareRecycleStatusGet", [&] { share.IsEnableRecycleBin(); },
+               "502 KLIBShareRecycleStatusGet failed, share=photo"},
+           Row{"KLIBShareIsEncryptionGet", [&] { share.IsEncryption(); },
+               "502 KLIBShareIsEncryptionGet failed, share=photo"},
+           Row{"KLIBShareIsEncryptedGet", [&] { share.CanBeIndexed(); },
+               "502 KLIBShareis_encryptedGet failed, share=photo"},
+           Row{"KLIBShareIsReadOnlyGet", [&] { share.CanBeIndexed(); },
+               "502 KLIBShareis_readonlyGet failed, share=photo"},
+           Row{"KLIBShareEnum", [] { SDKShare::Enum(); }, "121 KLIBShareEnum failed"},
+       }) {
+    platform_.failing = {{row.call, {}}};
+    EXPECT_EQ(Failure(row.use), row.failure);
+    EXPECT_EQ(log_.Lines().back().rfind("share:", 0), 0U) << log_.Lines().back();
+  }
+}
+
+TEST_F(SDKShareTest, OnlyLackOfSpaceIsLackOfSpace) {
+  const SDKShare share("photo");
+  EXPECT_TRUE(share.IsSpaceEnough());
+  EXPECT_TRUE(platform_.Called("KOVAQuotaIsEnough(0, /volume1/photo, 104857600)"));
+  for (const auto& [code, enough] :
+       {std::pair<int, bool>{0x2900, false}, {0x2400, false}, {KOVA_ERR_SYSTEM, true}, {KOVA_ERR_NONE, true}}) {
+    platform_.failing["KOVAQuotaIsEnough"] = {code};
+    EXPECT_EQ(share.IsSpaceEnough(), enough) << code;
+  }
+}
+
+TEST_F(SDKCredentialsTest, GivesTheIdentityBack) {
+  BecomeRoot();
+  {
+    SDKCredentials credentials;
+    EXPECT_TRUE(platform_.switches.empty());
+    credentials.AsUser("alice");
+    EXPECT_EQ(geteuid(), 1000U);
+  }
+  EXPECT_EQ(platform_.switches, (std::vector<std::string>{"alice", "root"}));
+  EXPECT_EQ(geteuid(), 0U);
+  platform_.switches.clear();
+  platform_.euid = 1000;
+  { const SDKCredentials credentials("boss"); }
+  EXPECT_EQ(platform_.switches, (std::vector<std::string>{"root", "alice"})) << "an administrator works as root";
+  platform_.calls.clear();
+  { const SDKCredentials credentials; }
+  EXPECT_EQ(platform_.CallCount("ResetCredentialsByName"), 0) << "nothing changed, nothing to restore";
+}
+
+TEST_F(SDKCredentialsTest, FailuresAreThrownAlsoAtTheEnd) {
+  BecomeRoot();
+  platform_.failing["KOVAUserGetByUID"] = {0x1D00, 0, 1};
+  EXPECT_EQ(Failure([] { SDKCredentials credentials; }), "503 KOVAUserGetByUID failed, err=7424");
+  EXPECT_EQ(Failure([] { SDKCredentials credentials("stranger"); }), "503 ");
+  EXPECT_TRUE(log_.Contains("Failed [!ResetCredentialsByName(target_username)]"));
+  platform_.failing["ResetCredentialsByName"] = {KOVA_ERR_SYSTEM, 1, 1};
+  EXPECT_EQ(Failure([] { SDKCredentials credentials("alice"); }), "503 ");
+  EXPECT_TRUE(log_.Contains("(~SDKCredentials) Failed [!ResetCredentialsByName(username_)]"));
+  // While another failure is on its way the second one is only logged.
+  platform_.euid = 0;
+  platform_.failing["ResetCredentialsByName"] = {KOVA_ERR_SYSTEM, 1, 1};
+  EXPECT_EQ(Failure([] {
+              const SDKCredentials credentials("alice");
+              throw Error(Error::kInternal, "first");
+            }),
+            "502 first");
+}
+
+}  // namespace ferrox::sdk
