@@ -1,0 +1,355 @@
+#include "platform/host/content/markup.h"
+
+#include <algorithm>
+#include <array>
+#include <cstring>
+
+#include "platform/host/content/entities.h"
+#include "platform/host/content/utf8.h"
+
+namespace kova::content {
+
+namespace {
+
+using namespace std::literals;
+
+constexpr size_t kTitleMaxBytes = 1024;
+constexpr size_t kAttributeMaxBytes = 64 * 1024;  // a quote that is not closed within this is no quote
+constexpr size_t kReferenceMaxBytes = 32;
+constexpr size_t kNotFound = std::string_view::npos;
+
+char Lower(char c) { return c >= 'A' && c <= 'Z' ? static_cast<char>(c - 'A' + 'a') : c; }
+
+bool IsBlank(char c) { return c == ' ' || c == '\t' || c == '\n' || c == '\r' || c == '\f'; }
+
+bool IsLetter(char c) { return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z'); }
+
+bool IsNameByte(char c) {
+  return IsLetter(c) || (c >= '0' && c <= '9') || c == '-' || c == '_' || c == ':' || c == '.' || (c & 0x80) != 0;
+}
+
+bool StartsWithNoCase(std::string_view text, std::string_view lower_prefix) {
+  if (text.size() < lower_prefix.size()) return false;
+  return std::equal(lower_prefix.begin(), lower_prefix.end(), text.begin(),
+                    [](char wanted, char c) { return wanted == Lower(c); });
+}
+
+/// Remembers where a byte comes next, so that asking again from further on does not search the same bytes again.
+class NextByte {
+ public:
+  explicit NextByte(char wanted) : wanted_(wanted) {}
+
+  /// The first place at or after `from`; the text's size when there is none.
+  size_t Find(std::string_view text, size_t from) {
+    if (!known_ || at_ < from) {
+      const void* found = from < text.size() ? memchr(text.data() + from, wanted_, text.size() - from) : nullptr;
+      at_ = found != nullptr ? static_cast<size_t>(static_cast<const char*>(found) - text.data()) : text.size();
+      known_ = true;
+    }
+    return at_;
+  }
+
+ private:
+  char wanted_;
+  bool known_ = false;
+  size_t at_ = 0;
+};
+
+/// Collects text with runs of blanks as one, up to a limit.
+class TextSink {
+ public:
+  explicit TextSink(size_t limit_bytes) : limit_bytes_(limit_bytes) {}
+
+  void Add(std::string_view piece) {
+    while (!piece.empty()) {
+      const auto end = std::find_if(piece.begin(), piece.end(), &IsBlank);
+      const auto length = static_cast<size_t>(end - piece.begin());
+      if (length > 0) AddWord(piece.substr(0, length));
+      piece.remove_prefix(length);
+      while (!piece.empty() && IsBlank(piece.front())) {
+        Separate(piece.front() == '\n' ? '\n' : ' ');
+        piece.remove_prefix(1);
+      }
+    }
+  }
+
+  /// What stands between the text so far and what follows; a line end wins over a blank.
+  void Separate(char separator) {
+    if (separator_ != '\n') separator_ = separator;
+  }
+
+  bool Full() const { return full_; }
+  std::string Take() { return std::move(text_); }
+  bool Empty() const { return text_.empty(); }
+
+ private:
+  void AddWord(std::string_view word) {
+    const size_t separator = separator_ != '\0' && !text_.empty() ? 1 : 0;
+    if (text_.size() + separator + word.size() > limit_bytes_) {
+      const size_t room = limit_bytes_ - std::min(limit_bytes_, text_.size() + separator);
+      word = CutAtCharacter(word, room);
+      full_ = true;
+    }
+    if (!word.empty()) {
+      if (separator != 0) text_ += separator_;
+      text_ += word;
+    }
+    separator_ = '\0';
+  }
+
+  size_t limit_bytes_;
+  std::string text_;
+  char separator_ = '\0';
+  bool full_ = false;
+};
+
+/// Elements of HTML within a line: they do not separate words.
+constexpr std::string_view kInline[] = {"a",      "abbr", "acronym", "b",  "bdi",  "bdo",   "big",  "cite",
+                                        "code",   "del",  "dfn",     "em", "font", "i",     "ins",  "kbd",
+                                        "mark",   "nobr", "q",       "s",  "samp", "small", "span", "strike",
+                                        "strong", "sub",  "sup",     "tt", "u",    "var",   "wbr"};
+
+bool IsInline(std::string_view name) {
+  return std::find(std::begin(kInline), std::end(kInline), name) != std::end(kInline);
+}
+
+bool IsCell(std::string_view name) { return name == "td" || name == "th" || name == "img" || name == "input"; }
+
+/// Code points that HTML reads as Windows-1252's.
+constexpr std::array<uint16_t, 32> kWindows1252 = {0x20AC, 0x81,   0x201A, 0x0192, 0x201E, 0x2026, 0x2020, 0x2021,
+                                                   0x02C6, 0x2030, 0x0160, 0x2039, 0x0152, 0x8D,   0x017D, 0x8F,
+                                                   0x90,   0x2018, 0x2019, 0x201C, 0x201D, 0x2022, 0x2013, 0x2014,
+                                                   0x02DC, 0x2122, 0x0161, 0x203A, 0x0153, 0x9D,   0x017E, 0x0178};
+
+class Reader {
+ public:
+  Reader(std::string_view source, size_t limit_bytes, bool html)
+      : source_(source), html_(html), text_(limit_bytes), title_(kTitleMaxBytes) {}
+
+  MarkupText Read() {
+    while (at_ < source_.size() && !text_.Full()) {
+      const size_t next = std::min(source_.find('<', at_), source_.size());
+      AddCharacters(source_.substr(at_, next - at_));
+      at_ = next;
+      if (at_ < source_.size()) ReadMarkup();
+    }
+    MarkupText result;
+    result.title = title_.Take();
+    result.text = text_.Take();
+    result.cut = text_.Full();
+    return result;
+  }
+
+ private:
+  /// A title that never ends is given up when it is long enough.
+  TextSink& Sink() {
+    if (title_.Full()) in_title_ = false;
+    return in_title_ ? title_ : text_;
+  }
+
+  void ReadMarkup() {
+    const std::string_view rest = source_.substr(at_);
+    if (rest.substr(0, 4) == "<!--"sv) return SkipPast("-->"sv);
+    if (rest.substr(0, 9) == "<![CDATA["sv) return ReadCData();
+    if (rest.substr(0, 2) == "<?"sv) return SkipPast(html_ ? ">"sv : "?>"sv);
+    if (rest.substr(0, 2) == "<!"sv) return SkipDeclaration();
+    const size_t name_at = rest.size() > 1 && rest[1] == '/' ? 2 : 1;
+    const bool is_tag = rest.size() > name_at &&
+                        (IsLetter(rest[name_at]) || (!html_ && (rest[name_at] == '_' || (rest[name_at] & 0x80) != 0)));
+    if (is_tag) return ReadTag(name_at == 2);
+    Sink().Add("<"sv);
+    ++at_;
+  }
+
+  /// An end that never comes ends the document, once: it is not looked for again.
+  void SkipPast(std::string_view end) {
+    const size_t found = source_.find(end, at_);
+    at_ = found == kNotFound ? source_.size() : found + end.size();
+  }
+
+  void ReadCData() {
+    const size_t begin = at_ + "<![CDATA["sv.size();
+    const size_t end = source_.find("]]>"sv, begin);
+    Sink().Add(source_.substr(begin, end == kNotFound ? kNotFound : end - begin));
+    at_ = end == kNotFound ? source_.size() : end + 3;
+  }
+
+  /// A document type, whose declarations in "[" and "]" are passed over unread.
+  void SkipDeclaration() {
+    char quote = '\0';
+    bool inside = false;
+    for (; at_ < source_.size(); ++at_) {
+      const char c = source_[at_];
+      if (quote != '\0') {
+        if (c == quote) quote = '\0';
+      } else if (!html_ && (c == '"' || c == '\'')) {
+        quote = c;
+      } else if (!html_ && c == '[') {
+        inside = true;
+      } else if (c == ']') {
+        inside = false;
+      } else if (c == '>' && !inside) {
+        ++at_;
+        return;
+      }
+    }
+  }
+
+  void ReadTag(bool closing) {
+    const size_t begin = at_ + (closing ? 2 : 1);
+    size_t end = begin;
+    std::array<char, 24> lower;
+    while (end < source_.size() && IsNameByte(source_[end])) ++end;
+    std::string_view name = source_.substr(begin, end - begin);
+    if (!html_) name.remove_prefix(name.find(':') == kNotFound ? 0 : name.find(':') + 1);
+    name = name.substr(0, lower.size());
+    std::transform(
+        name.begin(), name.end(), lower.begin(), html_ ? &Lower : [](char c) { return c; });
+    at_ = end;
+    const bool empty_element = SkipAttributes();
+    Enter(std::string_view(lower.data(), name.size()), closing, empty_element);
+  }
+
+  /// Passes the attributes and the ">"; whether a "/" stood before it.
+  bool SkipAttributes() {
+    while (at_ < source_.size()) {
+      const char c = source_[at_];
+      if (c == '>') {
+        ++at_;
+        return source_[at_ - 2] == '/';
+      }
+      if (c == '<' && !html_) return false;  // the tag was not closed; the next one begins here
+      ++at_;
+      if (c != '"' && c != '\'') continue;
+      const size_t close = (c == '"' ? next_double_ : next_single_).Find(source_, at_);
+      if (close - at_ <= kAttributeMaxBytes && close < source_.size()) at_ = close + 1;
+    }
+    return false;
+  }
+
+  void Enter(std::string_view name, bool closing, bool empty_element) {
+    if (name == "title"sv) {
+      in_title_ = !closing && !empty_element && title_.Empty();
+    } else if (html_ && !closing && (name == "script"sv || name == "style"sv)) {
+      SkipRawText(name);
+    } else if (!html_ && !closing && !empty_element && name == "binary"sv) {
+      SkipRawText(name);  // pictures inside of e-books
+    }
+    if (html_ && IsInline(name)) return;
+    Sink().Separate(!html_ || IsCell(name) ? ' ' : '\n');
+  }
+
+  /// Passes everything up to the element's closing tag; without one, to the end.
+  void SkipRawText(std::string_view name) {
+    while (at_ < source_.size()) {
+      at_ = std::min(source_.find("</"sv, at_), source_.size());
+      if (at_ == source_.size() || StartsWithNoCase(source_.substr(at_ + 2), name)) return;
+      at_ += 2;
+    }
+  }
+
+  void AddCharacters(std::string_view characters) {
+    TextSink& sink = Sink();
+    while (!characters.empty()) {
+      const size_t reference = std::min(characters.find('&'), characters.size());
+      sink.Add(characters.substr(0, reference));
+      characters.remove_prefix(reference);
+      if (!characters.empty()) characters.remove_prefix(AddReference(characters, sink));
+    }
+  }
+
+  /// Resolves the reference that the text begins with; returns its length. What is none stands for itself.
+  size_t AddReference(std::string_view text, TextSink& sink) const {
+    const size_t end = text.substr(0, kReferenceMaxBytes).find(';');
+    const uint32_t code_point = end == kNotFound ? 0 : Resolve(text.substr(1, end - 1));
+    if (code_point == 0) {
+      sink.Add("&"sv);
+      return 1;
+    }
+    if (code_point == 0xA0) {
+      sink.Separate(' ');
+    } else {
+      std::string character;
+      AppendUtf8(character, code_point);
+      sink.Add(character);
+    }
+    return end + 1;
+  }
+
+  /// The character of the reference `name`, without "&" and ";"; 0 when it is not known.
+  uint32_t Resolve(std::string_view name) const {
+    if (name.size() < 2 || name[0] != '#') return html_ ? HtmlEntity(name) : XmlEntity(name);
+    const bool hex = name[1] == 'x' || name[1] == 'X';
+    uint32_t code_point = 0;
+    for (const char c : name.substr(hex ? 2 : 1)) {
+      const char lower = Lower(c);
+      const bool digit = c >= '0' && c <= '9';
+      if (!digit && !(hex && lower >= 'a' && lower <= 'f')) return 0;
+      const auto value = static_cast<uint32_t>(digit ? c - '0' : lower - 'a' + 10);
+      code_point = std::min<uint32_t>(code_point * (hex ? 16 : 10) + value, 0x110000);
+    }
+    if (html_ && code_point >= 0x80 && code_point < 0xA0) return kWindows1252[code_point - 0x80];
+    return code_point < 0x20 ? ' ' : code_point;
+  }
+
+  static uint32_t XmlEntity(std::string_view name) {
+    const bool known = name == "amp"sv || name == "lt"sv || name == "gt"sv || name == "quot"sv || name == "apos"sv;
+    return known ? HtmlEntity(name) : 0;
+  }
+
+  std::string_view source_;
+  bool html_;
+  size_t at_ = 0;
+  TextSink text_;
+  TextSink title_;
+  bool in_title_ = false;
+  NextByte next_double_{'"'};
+  NextByte next_single_{'\''};
+};
+
+/// The value that follows `key` and "=" at the beginning of `text`, quoted or not.
+std::string ValueAfter(std::string_view text, std::string_view key) {
+  if (!StartsWithNoCase(text, key)) return {};
+  text.remove_prefix(key.size());
+  const auto skip_blanks = [&text] { text.remove_prefix(std::min(text.find_first_not_of(" \t\r\n"sv), text.size())); };
+  skip_blanks();
+  if (text.empty() || text.front() != '=') return {};
+  text.remove_prefix(1);
+  skip_blanks();
+  if (!text.empty() && (text.front() == '"' || text.front() == '\'')) text.remove_prefix(1);
+  size_t length = 0;
+  while (length < text.size() && length < 40 && IsNameByte(text[length])) ++length;
+  return std::string(text.substr(0, length));
+}
+
+}  // namespace
+
+MarkupText ReadHtml(std::string_view source, size_t limit_bytes) { return Reader(source, limit_bytes, true).Read(); }
+
+MarkupText ReadXml(std::string_view source, size_t limit_bytes) { return Reader(source, limit_bytes, false).Read(); }
+
+std::string DeclaredHtmlEncoding(std::string_view head) {
+  head = head.substr(0, 4096);
+  for (size_t tag = head.find('<'); tag != kNotFound; tag = head.find('<', tag + 1)) {
+    if (!StartsWithNoCase(head.substr(tag), "<meta"sv)) continue;
+    const std::string_view inside = head.substr(tag, head.find('>', tag) - tag);
+    for (size_t at = 5; at < inside.size(); ++at) {
+      std::string value = ValueAfter(inside.substr(at), "charset"sv);
+      if (!value.empty()) return value;
+    }
+  }
+  return DeclaredXmlEncoding(head);
+}
+
+std::string DeclaredXmlEncoding(std::string_view head) {
+  const size_t begin = head.substr(0, 5) == "<?xml"sv ? 5 : kNotFound;
+  if (begin == kNotFound) return {};
+  const std::string_view inside = head.substr(0, std::min<size_t>(head.find("?>"sv), 512));
+  for (size_t at = begin; at < inside.size(); ++at) {
+    std::string value = ValueAfter(inside.substr(at), "encoding"sv);
+    if (!value.empty()) return value;
+  }
+  return {};
+}
+
+}  // namespace kova::content

@@ -1,0 +1,26 @@
+#pragma once
+
+#include <cstddef>
+#include <string>
+#include <string_view>
+
+/// Text out of HTML and XML, in one pass over the bytes with constant memory beside the result. No document type is
+/// read, no entity is defined by the content, nothing is fetched; what is not well-formed is read as far as it goes.
+namespace kova::content {
+
+struct MarkupText {
+  std::string title;
+  std::string text;  ///< valid UTF-8 when the input is
+  bool cut = false;  ///< there was more text than the limit
+};
+
+/// Tags become blanks or line ends, scripts and styles are dropped, references to characters are resolved, and runs of
+/// blanks are one.
+MarkupText ReadHtml(std::string_view source, size_t limit_bytes);
+MarkupText ReadXml(std::string_view source, size_t limit_bytes);
+
+/// The encoding that the beginning of the content declares for itself; empty when it does not.
+std::string DeclaredHtmlEncoding(std::string_view head);
+std::string DeclaredXmlEncoding(std::string_view head);
+
+}  // namespace kova::content
