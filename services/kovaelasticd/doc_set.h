@@ -1,0 +1,57 @@
+#pragma once
+
+#include <cstdint>
+#include <vector>
+
+namespace ferrox::engine {
+
+/// A set of document numbers, one bit each.
+class DocSet {
+ public:
+  void Add(int64_t id) {
+    const auto word = static_cast<size_t>(id) >> 6;
+    if (word >= words_.size()) words_.resize(word + word / 2 + 16);
+    words_[word] |= uint64_t{1} << (id & 63);
+  }
+  void Remove(int64_t id) {
+    const auto word = static_cast<size_t>(id) >> 6;
+    if (word < words_.size()) words_[word] &= ~(uint64_t{1} << (id & 63));
+  }
+  bool Contains(int64_t id) const {
+    const auto word = static_cast<size_t>(id) >> 6;
+    return word < words_.size() && (words_[word] >> (id & 63) & 1) != 0;
+  }
+  void IntersectWith(const DocSet& other) {
+    if (words_.size() > other.words_.size()) words_.resize(other.words_.size());
+    for (size_t i = 0; i < words_.size(); ++i) words_[i] &= other.words_[i];
+  }
+  void UniteWith(const DocSet& other) {
+    if (words_.size() < other.words_.size()) words_.resize(other.words_.size());
+    for (size_t i = 0; i < other.words_.size(); ++i) words_[i] |= other.words_[i];
+  }
+  void Subtract(const DocSet& other) {
+    const size_t common = words_.size() < other.words_.size() ? words_.size() : other.words_.size();
+    for (size_t i = 0; i < common; ++i) words_[i] &= ~other.words_[i];
+  }
+  int64_t Count() const {
+    int64_t count = 0;
+    for (const uint64_t word : words_) count += __builtin_popcountll(word);
+    return count;
+  }
+  size_t SizeBytes() const { return words_.capacity() * sizeof(uint64_t); }
+
+  /// Calls `visit` for each number in ascending order until it returns false.
+  template <typename Visitor>
+  void ForEach(Visitor&& visit) const {
+    for (size_t i = 0; i < words_.size(); ++i) {
+      for (uint64_t word = words_[i]; word != 0; word &= word - 1) {
+        if (!visit(static_cast<int64_t>(i * 64) + __builtin_ctzll(word))) return;
+      }
+    }
+  }
+
+ private:
+  std::vector<uint64_t> words_;
+};
+
+}  // namespace ferrox::engine

@@ -1,0 +1,30 @@
+#pragma once
+
+#include <string>
+
+#include <json/value.h>
+
+#include "services/kovaelasticd/commands.h"
+#include "services/kovaelasticd/registry.h"
+#include "services/support/frame_server.h"
+
+namespace ferrox::engine {
+
+/// Answers the engine's requests (docs/formats/engine.md). Any number of threads may call Handle.
+class Engine {
+ public:
+  /// Loads the indices that are noted in `state_folder`. @throws Error kInternal.
+  explicit Engine(const std::string& state_folder);
+
+  /// One request to one reply, whatever the request holds.
+  std::string Handle(const std::string& request, const services::Peer& peer);
+
+ private:
+  Json::Value Answer(const std::string& request, const services::Peer& peer);
+  Json::Value AnswerCompound(Json::Value& parts);
+  size_t AnswerChanges(Json::Value& parts, Json::ArrayIndex first, Json::Value& answers);
+
+  Registry registry_;
+};
+
+}  // namespace ferrox::engine

@@ -1,0 +1,175 @@
+#include "services/kovaelasticd/fts.h"
+
+#include <algorithm>
+#include <cstring>
+#include <string_view>
+
+#include "services/kovaelasticd/document.h"
+#include "services/kovaelasticd/words.h"
+
+namespace ferrox::engine {
+
+namespace {
+
+constexpr char kCollectorType[] = "HitCollector";
+/// A name has at most 255 bytes; a display text that takes its place is cut.
+constexpr size_t kNameGramsMax = 512;
+
+using TokenSink = int (*)(void*, int, const char*, int, int, int);
+
+/// Hands words on to the full-text index.
+class TokenOutput {
+ public:
+  TokenOutput(void* context, TokenSink sink) : context_(context), sink_(sink) {}
+  bool Put(std::string_view word, size_t begin, size_t end) {
+    result_ =
+        sink_(context_, 0, word.data(), static_cast<int>(word.size()), static_cast<int>(begin), static_cast<int>(end));
+    return result_ == SQLITE_OK;
+  }
+  int Result() const { return result_; }
+
+ private:
+  void* context_;
+  TokenSink sink_;
+  int result_ = SQLITE_OK;
+};
+
+void PutGrams(TokenOutput& output, std::string_view text) {
+  for (const std::string& gram : Trigrams(text, kNameGramsMax)) {
+    if (!output.Put(gram, 0, 0)) return;
+  }
+}
+
+void PutReadyWords(TokenOutput& output, std::string_view text) {
+  while (!text.empty()) {
+    const size_t end = text.find(kReadyEnd);
+    if (end == std::string_view::npos || !output.Put(text.substr(0, end), 0, 0)) return;
+    text.remove_prefix(end + 1);
+  }
+}
+
+void PutWords(TokenOutput& output, std::string_view text) {
+  WordScanner scanner(text);
+  while (scanner.Next() && output.Put(scanner.Word(), scanner.Begin(), scanner.End())) {
+  }
+}
+
+int Tokenize(Fts5Tokenizer* /*tokenizer*/, void* context, int flags, const char* text, int size, TokenSink sink) {
+  const std::string_view all(text == nullptr ? "" : text, static_cast<size_t>(size));
+  TokenOutput output(context, sink);
+  if ((flags & FTS5_TOKENIZE_QUERY) != 0) {
+    (void)output.Put(all, 0, all.size());  // expressions are built from ready words
+  } else if (!all.empty() && all.front() == kGramsMark) {
+    PutGrams(output, all.substr(1));
+  } else if (!all.empty() && all.front() == kReadyMark) {
+    PutReadyWords(output, all.substr(1));
+  } else {
+    PutWords(output, all);
+  }
+  return output.Result();
+}
+
+int CreateTokenizer(void* /*context*/, const char** /*arguments*/, int /*count*/, Fts5Tokenizer** tokenizer) {
+  static char stateless;
+  *tokenizer = reinterpret_cast<Fts5Tokenizer*>(&stateless);
+  return SQLITE_OK;
+}
+
+void DeleteTokenizer(Fts5Tokenizer* /*tokenizer*/) {}
+
+uint8_t PlaceOfColumn(int column) {
+  constexpr uint8_t kPlaces[] = {kInNamePart, kInName, kInTitle, kInText, kInText};
+  return column >= 0 && column <= kFieldsColumn ? kPlaces[column] : uint8_t{0};
+}
+
+/// What the rows of one phrase are collected with.
+struct PhraseVisit {
+  HitCollector* collector;
+  bool content;  ///< the table of contents, which has one column
+};
+
+int VisitRow(const Fts5ExtensionApi* api, Fts5Context* row, void* user) {
+  const auto* visit = static_cast<const PhraseVisit*>(user);
+  Fts5PhraseIter iterator;
+  int column = -1;
+  int offset = -1;
+  const int result = api->xPhraseFirst(row, 0, &iterator, &column, &offset);
+  if (result != SQLITE_OK) return result;
+  uint8_t count = 0;
+  uint8_t places = 0;
+  for (; column >= 0 && count < kCountMax; api->xPhraseNext(row, &iterator, &column, &offset)) {
+    ++count;
+    if (!visit->content) places |= PlaceOfColumn(column);
+  }
+  visit->collector->Add(api->xRowid(row), visit->content ? count : uint8_t{0}, places);
+  return SQLITE_OK;
+}
+
+/// kova_collect(table, collector): walks all rows of each phrase of the expression, in place of the caller's cursor.
+void CollectFunction(const Fts5ExtensionApi* api, Fts5Context* row, sqlite3_context* context, int count,
+                     sqlite3_value** arguments) {
+  auto* collector =
+      count == 1 ? static_cast<HitCollector*>(sqlite3_value_pointer(arguments[0], kCollectorType)) : nullptr;
+  if (collector == nullptr) {
+    sqlite3_result_error(context, "kova_collect is for the engine alone", -1);
+    return;
+  }
+  PhraseVisit visit = {collector, api->xColumnCount(row) == 1};
+  for (int phrase = 0; phrase < api->xPhraseCount(row); ++phrase) {
+    const int result = api->xQueryPhrase(row, phrase, &visit, &VisitRow);
+    if (result != SQLITE_OK) {
+      sqlite3_result_error_code(context, result);
+      return;
+    }
+  }
+}
+
+fts5_api* FullTextApi(Database& database) {
+  fts5_api* api = nullptr;
+  Statement statement = database.Prepare("SELECT fts5(?1)");
+  statement.BindPointer(1, &api, "fts5_api_ptr");
+  (void)statement.Step();
+  if (api == nullptr) database.Fail(SQLITE_ERROR);
+  return api;
+}
+
+}  // namespace
+
+void HitCollector::Add(int64_t id, uint8_t count, uint8_t places) {
+  set_.Add(id);
+  if (hits_.size() >= 2 * hits_max_) hits_.erase(hits_.begin(), hits_.end() - static_cast<ptrdiff_t>(hits_max_));
+  hits_.push_back({static_cast<uint32_t>(id), count, places});
+}
+
+std::vector<WordHit> HitCollector::TakeHits() { return std::move(hits_); }
+
+void RegisterFullText(Database& database) {
+  fts5_api* api = FullTextApi(database);
+  fts5_tokenizer tokenizer = {&CreateTokenizer, &DeleteTokenizer, &Tokenize};
+  database.Check(api->xCreateTokenizer(api, "kova", nullptr, &tokenizer, nullptr));
+  database.Check(api->xCreateFunction(api, "kova_collect", nullptr, &CollectFunction, nullptr));
+}
+
+std::string PhraseExpression(const std::vector<std::string>& words, bool prefix) {
+  std::string expression;
+  for (const std::string& word : words) {
+    if (!expression.empty()) expression += " + ";
+    expression += '"';
+    for (const char c : word) {
+      if (c == '"') expression += '"';
+      expression += c;
+    }
+    expression += '"';
+  }
+  return prefix ? expression + " *" : expression;
+}
+
+void Collect(Database& database, const char* table, const std::string& expression, HitCollector& collector) {
+  const std::string name(table);
+  Statement statement =
+      database.Prepare("SELECT kova_collect(" + name + ", ?1) FROM " + name + " WHERE " + name + " MATCH ?2 LIMIT 1");
+  statement.BindPointer(1, &collector, kCollectorType).Bind(2, std::string_view(expression));
+  (void)statement.Step();
+}
+
+}  // namespace ferrox::engine

@@ -1,0 +1,93 @@
+#pragma once
+
+#include <atomic>
+#include <chrono>
+#include <condition_variable>
+#include <deque>
+#include <exception>
+#include <functional>
+#include <memory>
+#include <mutex>
+#include <shared_mutex>
+#include <string>
+#include <thread>
+
+#include "services/kovaelasticd/index_store.h"
+
+namespace ferrox::engine {
+
+/// An open index: its store and the thread that alone changes it. Any number of threads may call any member.
+///
+/// Changes of several callers share a transaction; a commit that several wait for is made once. What nobody commits is
+/// committed after kAutoCommitAfter or kAutoCommitBytes. When changes that were answered with success are lost (a full
+/// disk, or a process that died: a marker file beside the index tells), the next commit fails, so that whoever relies
+/// on it sends them again.
+class Index {
+ public:
+  static constexpr std::chrono::seconds kAutoCommitAfter{5};
+  static constexpr int64_t kAutoCommitBytes = 64 << 20;
+
+  /// `marker_path` is the file that exists while there are uncommitted changes.
+  Index(std::unique_ptr<IndexStore> store, std::string marker_path);
+  Index(const Index&) = delete;
+  Index& operator=(const Index&) = delete;
+  /// Commits and closes.
+  ~Index();
+
+  using Job = std::function<void(IndexStore&)>;
+  /// Has `job` run by the index's thread and waits for it; what it throws is thrown here. After kEngineStorage the
+  /// changes since the last commit are gone.
+  /// @throws Error kEngineIndexPaused when the index was closed meanwhile.
+  void Write(const Job& job);
+  /// The same for a job that changes nothing.
+  void Read(const Job& job);
+  /// Makes everything that was answered before durable.
+  void Commit();
+  SearchReply Search(const SearchRequest& request);
+  StoreStat Stat();
+  /// The number of changes that are not committed yet.
+  int64_t Uncommitted() const { return uncommitted_; }
+  /// Commits and closes the store; waits for what runs.
+  void Close();
+
+ private:
+  enum class Kind { kRead, kWrite, kCommit };
+  struct Task {
+    Kind kind;
+    const Job* job;
+    std::exception_ptr failure;
+    bool done = false;
+  };
+
+  void Submit(Kind kind, const Job* job);
+  void ThreadMain();
+  std::deque<Task*> WaitForTasks();
+  void Execute(Task& task);
+  void RunChange(Task& task);
+  void CommitFor(const std::deque<Task*>& waiting);
+  void CommitByItself();
+  void CommitStore();
+  void LoseChanges();
+  void Mark();
+  void Unmark();
+
+  std::shared_mutex store_mutex_;  ///< shared: uses the store; exclusive: closes it
+  std::unique_ptr<IndexStore> store_;
+  const std::string marker_path_;
+
+  std::mutex mutex_;
+  std::condition_variable wake_thread_;
+  std::condition_variable wake_callers_;
+  std::deque<Task*> tasks_;
+  bool stopping_ = false;
+
+  // Of the thread alone, except for reading the count.
+  std::atomic<int64_t> uncommitted_{0};
+  bool marked_ = false;
+  bool lost_ = false;
+  std::chrono::steady_clock::time_point auto_commit_at_;
+
+  std::thread thread_;
+};
+
+}  // namespace ferrox::engine

@@ -1,0 +1,53 @@
+#include <cstdio>
+#include <cstring>
+
+#include "common/error.h"
+#include "common/paths.h"
+#include "services/kovaelasticd/engine.h"
+#include "services/support/daemon.h"
+#include "services/support/frame_server.h"
+
+namespace {
+
+constexpr char kHelp[] =
+    "usage: kovaelasticd [--help | --version]\n"
+    "Keeps the search indices and answers requests on its socket, in the foreground, until SIGTERM or SIGINT.\n"
+    "FERROX_ROOT chooses the instance: a folder before every path of the product.\n";
+
+void Serve() {
+  using namespace ferrox;
+  constexpr uint32_t kRequestMaxBytes = 256U << 20;
+  constexpr unsigned kWorkers = 16;
+  services::Daemon daemon("kovaelasticd");
+  const std::string state_folder = InstancePath("/var/lib/kova/kovaelasticd");
+  if (!services::MakeFolders(state_folder, 0700)) {
+    throw Error(Error::kInternal, "cannot make the folder " + state_folder);
+  }
+  engine::Engine engine(state_folder);
+  services::FrameServerOptions options;
+  options.socket_path = InstancePath(kElasticdSocket);
+  options.socket_mode = 0660;
+  options.request_limit_bytes = kRequestMaxBytes;
+  options.requests_limit_bytes = 2ULL * kRequestMaxBytes;
+  options.workers = kWorkers;
+  services::FrameServer server(options, [&engine](const std::string& request, const services::Peer& peer) {
+    return engine.Handle(request, peer);
+  });
+  daemon.NotifyReady();
+  server.Run(daemon.StopFd());
+}
+
+}  // namespace
+
+int main(int argc, char** argv) {
+  if (argc == 2 && strcmp(argv[1], "--help") == 0) return fputs(kHelp, stdout) < 0 ? 3 : 0;
+  if (argc == 2 && strcmp(argv[1], "--version") == 0) return printf("kovaelasticd %s\n", ferrox::engine::kVersion) < 0;
+  if (argc != 1) return fputs(kHelp, stderr) < 0 ? 3 : 2;
+  try {
+    Serve();
+    return 0;
+  } catch (const std::exception& error) {
+    (void)fprintf(stderr, "kovaelasticd: %s\n", error.what());
+    return 3;
+  }
+}

@@ -1,0 +1,53 @@
+#pragma once
+
+#include <cstdint>
+#include <limits>
+#include <memory>
+#include <string>
+#include <string_view>
+#include <vector>
+
+namespace ferrox::engine {
+
+/// One condition of a query, or several joined (docs/formats/engine.md describes the language).
+struct QueryNode {
+  enum class Type {
+    kAll,    ///< every document
+    kAnd,    ///< all of `children`; none: every document
+    kOr,     ///< one of `children`
+    kNot,    ///< not `children[0]`
+    kText,   ///< a word, phrase or beginning of a word in content, name or fields
+    kField,  ///< the same in one of `fields`
+    kName,   ///< the same in the name
+    kExt,    ///< the extension is `text`
+    kKind,   ///< the kind is one of `kinds`
+    kPath,   ///< lies in the folder `text`, or is it
+    kSize,   ///< the size lies in `low` .. `high`
+    kDate,   ///< the date of change lies in `low` .. `high`
+  };
+
+  Type type = Type::kAll;
+  std::vector<QueryNode> children;
+  std::string text;  ///< as written, without quotes
+  bool phrase = false;
+  bool prefix = false;
+  std::vector<std::string> fields;
+  std::vector<int32_t> kinds;
+  int64_t low = std::numeric_limits<int64_t>::min();
+  int64_t high = std::numeric_limits<int64_t>::max();
+};
+
+/// The longest query, in bytes.
+constexpr size_t kQueryMaxBytes = 4096;
+/// The most conditions and the deepest parentheses in one.
+constexpr size_t kQueryMaxTerms = 64;
+constexpr size_t kQueryMaxDepth = 16;
+
+/// Reads a query. Dates are taken in local time; `now` (seconds since the epoch) is what relative ones count from.
+/// @throws Error kEngineBadRequest with a sentence that names the place, counted in characters from 1, and the remedy.
+QueryNode ParseQuery(std::string_view text, int64_t now);
+
+/// The query in one canonical line, for tests: "(and word (not name:x))".
+std::string PrintQuery(const QueryNode& query);
+
+}  // namespace ferrox::engine

@@ -1,0 +1,186 @@
+#include "services/kovaelasticd/query_values.h"
+
+#include <algorithm>
+#include <ctime>
+#include <limits>
+#include <utility>
+
+#include "services/kovaelasticd/document.h"
+
+namespace ferrox::engine {
+
+namespace {
+
+constexpr int64_t kMin = std::numeric_limits<int64_t>::min();
+constexpr int64_t kMax = std::numeric_limits<int64_t>::max();
+constexpr int64_t kDaySec = 86400;
+
+/// Reads the digits at the front and takes them off; nothing when there are none or too many.
+std::optional<int64_t> TakeNumber(std::string_view& text, size_t digits_max) {
+  size_t digits = 0;
+  int64_t value = 0;
+  while (digits < text.size() && text[digits] >= '0' && text[digits] <= '9') {
+    if (++digits > digits_max) return std::nullopt;
+    value = value * 10 + (text[digits - 1] - '0');
+  }
+  if (digits == 0) return std::nullopt;
+  text.remove_prefix(digits);
+  return value;
+}
+
+std::optional<ValueRange> ParseSize(std::string_view text) {
+  const std::optional<int64_t> number = TakeNumber(text, 15);
+  if (!number.has_value()) return std::nullopt;
+  constexpr std::string_view kUnits = "kmgt";
+  int64_t factor = 1;
+  if (!text.empty()) {
+    const size_t unit = kUnits.find(static_cast<char>(text.front() | 0x20));
+    if (unit == std::string_view::npos) return std::nullopt;
+    factor <<= 10 * (unit + 1);
+    text.remove_prefix(1);
+  }
+  const bool unit_ends_well = text.empty() || text == "b" || text == "B" || text == "iB" || text == "ib";
+  if (!unit_ends_well || *number > kMax / factor) return std::nullopt;
+  return ValueRange{*number * factor, *number * factor};
+}
+
+int64_t LocalTime(int64_t year, int64_t month, int64_t day) {
+  tm parts = {};
+  parts.tm_year = static_cast<int>(year - 1900);
+  parts.tm_mon = static_cast<int>(month - 1);
+  parts.tm_mday = static_cast<int>(day);
+  parts.tm_isdst = -1;
+  return int64_t{mktime(&parts)};
+}
+
+ValueRange DayOf(int64_t moment, int days_before) {
+  const time_t seconds = static_cast<time_t>(moment);
+  tm parts = {};
+  (void)localtime_r(&seconds, &parts);
+  const int64_t year = parts.tm_year + 1900;
+  const int64_t month = parts.tm_mon + 1;
+  const int64_t day = parts.tm_mday - days_before;
+  return {LocalTime(year, month, day), LocalTime(year, month, day + 1) - 1};
+}
+
+/// "7d": from so long ago until now.
+std::optional<ValueRange> ParseAge(std::string_view text, int64_t now) {
+  const std::optional<int64_t> number = TakeNumber(text, 6);
+  if (!number.has_value() || text.size() != 1) return std::nullopt;
+  constexpr std::pair<char, int64_t> kUnits[] = {
+      {'h', 3600}, {'d', kDaySec}, {'w', 7 * kDaySec}, {'m', 30 * kDaySec}, {'y', 365 * kDaySec}};
+  for (const auto& [unit, seconds] : kUnits) {
+    if (unit == text.front()) return ValueRange{now - *number * seconds, kMax};
+  }
+  return std::nullopt;
+}
+
+/// A year, a month of one, or a day: its first and last second.
+std::optional<ValueRange> ParseCalendar(std::string_view text) {
+  const std::optional<int64_t> year = TakeNumber(text, 4);
+  if (!year.has_value() || *year < 1900) return std::nullopt;
+  if (text.empty()) return ValueRange{LocalTime(*year, 1, 1), LocalTime(*year + 1, 1, 1) - 1};
+  if (text.front() != '-') return std::nullopt;
+  text.remove_prefix(1);
+  const std::optional<int64_t> month = TakeNumber(text, 2);
+  if (!month.has_value() || *month < 1 || *month > 12) return std::nullopt;
+  if (text.empty()) return ValueRange{LocalTime(*year, *month, 1), LocalTime(*year, *month + 1, 1) - 1};
+  if (text.front() != '-') return std::nullopt;
+  text.remove_prefix(1);
+  const std::optional<int64_t> day = TakeNumber(text, 2);
+  if (!day.has_value() || *day < 1 || *day > 31 || !text.empty()) return std::nullopt;
+  return ValueRange{LocalTime(*year, *month, *day), LocalTime(*year, *month, *day + 1) - 1};
+}
+
+/// Reads "a", "a..b", "a..", "..b", ">a", ">=a", "<a", "<=a", where `parse` reads one value with its own extent.
+template <typename Parse>
+std::optional<ValueRange> ParseRange(std::string_view text, Parse parse) {
+  const size_t dots = text.find("..");
+  if (dots != std::string_view::npos) {
+    const std::string_view from = text.substr(0, dots);
+    const std::string_view to = text.substr(dots + 2);
+    const auto low = from.empty() ? ValueRange{kMin, kMin} : parse(from);
+    const auto high = to.empty() ? ValueRange{kMax, kMax} : parse(to);
+    if (!low.has_value() || !high.has_value() || (from.empty() && to.empty())) return std::nullopt;
+    return ValueRange{low->low, high->high};
+  }
+  const char sign = text.empty() ? '\0' : text.front();
+  if (sign != '<' && sign != '>') return parse(text);
+  text.remove_prefix(1);
+  const bool equal = !text.empty() && text.front() == '=';
+  if (equal) text.remove_prefix(1);
+  const auto value = parse(text);
+  if (!value.has_value()) return std::nullopt;
+  if (sign == '>') return ValueRange{equal ? value->low : value->high + 1, kMax};
+  return ValueRange{kMin, equal ? value->high : value->low - 1};
+}
+
+std::string Lower(std::string_view text) {
+  std::string lower(text);
+  for (char& c : lower) {
+    if (c >= 'A' && c <= 'Z') c = static_cast<char>(c + ('a' - 'A'));
+  }
+  return lower;
+}
+
+struct KindName {
+  const char* name;
+  Kind kind;
+};
+constexpr KindName kKindNames[] = {{"document", kDocument}, {"doc", kDocument}, {"audio", kAudio},   {"music", kAudio},
+                                   {"video", kVideo},       {"movie", kVideo},  {"image", kImage},   {"photo", kImage},
+                                   {"picture", kImage},     {"other", kOther},  {"folder", kFolder}, {"dir", kFolder},
+                                   {"directory", kFolder}};
+
+struct FriendlyName {
+  const char* name;
+  std::vector<std::string> fields;
+};
+const FriendlyName kFriendlyNames[] = {
+    {"title", {"KOVAMDTitle", "KOVAMDHeadline"}},
+    {"author", {"KOVAMDAuthors", "KOVAMDCreator", "KOVAMDContributors", "KOVAMDComposer"}},
+    {"artist", {"KOVAMDAuthors", "KOVAMDComposer", "KOVAMDParticipants"}},
+    {"album", {"KOVAMDAlbum"}},
+    {"genre", {"KOVAMDMusicalGenre"}},
+    {"year", {"KOVAMDRecordingYear"}},
+    {"keyword", {"KOVAMDKeywords", "_KOVAMDUserTags"}},
+    {"tag", {"KOVAMDKeywords", "_KOVAMDUserTags"}},
+    {"comment", {"KOVAMDComment", "KOVAMDFinderComment"}},
+    {"description", {"KOVAMDDescription", "KOVAMDHeadline"}},
+    {"camera", {"KOVAMDAcquisitionMake", "KOVAMDAcquisitionModel"}},
+    {"language", {"KOVAMDLanguages"}},
+    {"owner", {"KOVAMDOwnerUserID"}},
+    {"group", {"KOVAMDOwnerGroupID"}},
+    {"content", {field::kTextContent}},
+    {"text", {field::kTextContent}},
+};
+
+}  // namespace
+
+std::optional<ValueRange> ParseSizeRange(std::string_view text) { return ParseRange(text, &ParseSize); }
+
+std::optional<ValueRange> ParseDateRange(std::string_view text, int64_t now) {
+  const std::string lower = Lower(text);
+  if (lower == "today") return DayOf(now, 0);
+  if (lower == "yesterday") return DayOf(now, 1);
+  if (const auto age = ParseAge(lower, now)) return age;
+  return ParseRange(text, &ParseCalendar);
+}
+
+std::optional<int32_t> ParseKind(std::string_view text) {
+  const std::string lower = Lower(text);
+  for (const KindName& known : kKindNames) {
+    if (lower == known.name) return known.kind;
+  }
+  return std::nullopt;
+}
+
+std::vector<std::string> FriendlyFields(std::string_view name) {
+  const std::string lower = Lower(name);
+  for (const FriendlyName& known : kFriendlyNames) {
+    if (lower == known.name) return known.fields;
+  }
+  return {};
+}
+
+}  // namespace ferrox::engine

@@ -1,0 +1,29 @@
+#pragma once
+
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+namespace ferrox::engine {
+
+/// A range of numbers, both ends included.
+struct ValueRange {
+  int64_t low;
+  int64_t high;
+};
+
+/// ">10M", "<=2k", "1k..2M", "..5G", "700": bytes. Nothing when the text is no size.
+std::optional<ValueRange> ParseSizeRange(std::string_view text);
+
+/// "2024", "2024-01..2024-06", ">2024-01-01", "7d", "today": seconds since the epoch, by local time.
+std::optional<ValueRange> ParseDateRange(std::string_view text, int64_t now);
+
+/// The kinds that a name stands for; nothing when it is no kind.
+std::optional<int32_t> ParseKind(std::string_view text);
+
+/// The document fields that a friendly name stands for; empty when it is none.
+std::vector<std::string> FriendlyFields(std::string_view name);
+
+}  // namespace ferrox::engine

@@ -1,0 +1,59 @@
+#pragma once
+
+#include <string>
+#include <string_view>
+#include <unordered_map>
+
+#include <json/value.h>
+
+namespace ferrox::engine {
+
+/// The members of a document that the engine itself knows.
+namespace field {
+inline constexpr char kPath[] = "KOVAMDPath";
+inline constexpr char kParent[] = "KOVAMDParent";
+inline constexpr char kFsName[] = "KOVAMDFSName";
+inline constexpr char kSearchName[] = "KOVAMDSearchFileName";
+inline constexpr char kDisplayName[] = "KOVAMDDisplayName";
+inline constexpr char kKind[] = "KOVAMDKind";
+inline constexpr char kExtension[] = "KOVAMDExtension";
+inline constexpr char kIsDir[] = "KOVAMDIsDir";
+inline constexpr char kSize[] = "KOVAMDFSSize";
+inline constexpr char kContentChangeDate[] = "KOVAMDFSContentChangeDate";
+inline constexpr char kTextContent[] = "KOVAMDTextContent";
+inline constexpr char kTitle[] = "KOVAMDTitle";
+inline constexpr char kExtractError[] = "_KOVAExtractError";
+}  // namespace field
+
+/// How the fields of an index's documents are checked and searched, from the mappings that the index was created with.
+/// Does not change.
+class Schema {
+ public:
+  /// `mappings` as index_create carries them; null stands for none: nothing is checked then.
+  /// @throws Error kEngineBadRequest when they are not as they must be.
+  explicit Schema(const Json::Value& mappings);
+
+  /// @throws Error kEngineBadRequest, naming the field, when a member has not the type of its field.
+  void Check(const Json::Value& document) const;
+
+  /// Whether the plain words of a query look into the field.
+  bool IsPlain(const std::string& name) const;
+  /// Whether "field:value" looks into the field.
+  static bool IsSearchable(const std::string& name);
+
+  const Json::Value& Mappings() const { return mappings_; }
+
+ private:
+  enum class Type { kAny, kText, kInt, kDouble, kBool };
+  struct Field {
+    Type type = Type::kAny;
+    bool plain = true;
+  };
+  static Field ReadField(const std::string& name, const Json::Value& attributes, const Field& defaults);
+
+  Json::Value mappings_;
+  Field default_;
+  std::unordered_map<std::string, Field> fields_;
+};
+
+}  // namespace ferrox::engine

@@ -1,0 +1,155 @@
+#include <algorithm>
+#include <chrono>
+
+#include "common/clock.h"
+#include "common/error.h"
+#include "common/json_util.h"
+#include "services/kovaelasticd/commands.h"
+#include "services/kovaelasticd/query.h"
+#include "services/kovaelasticd/store_rows.h"
+
+namespace ferrox::engine {
+
+namespace {
+
+constexpr int64_t kLimitMax = 1000;
+/// Who wants to see more hits narrows the query.
+constexpr int64_t kLastHitMax = 100000;
+constexpr size_t kMarkMaxBytes = 64;
+
+struct IndexHit {
+  std::string index_id;
+  SearchHit hit;
+};
+
+[[noreturn]] void Refuse(const std::string& sentence) { throw Error(Error::kEngineBadRequest, sentence); }
+
+SortKey ReadSort(const Json::Value& data) {
+  const std::string name = OptionalText(data, "sort").value_or("relevance");
+  if (name == "relevance") return SortKey::kRelevance;
+  if (name == "date") return SortKey::kDate;
+  if (name == "name") return SortKey::kName;
+  if (name == "size") return SortKey::kSize;
+  Refuse("\"sort\" must be relevance, date, name or size");
+}
+
+bool ReadAscending(const Json::Value& data, SortKey sort) {
+  const std::string order = OptionalText(data, "order").value_or(sort == SortKey::kName ? "asc" : "desc");
+  if (order != "asc" && order != "desc") Refuse("\"order\" must be asc or desc");
+  return order == "asc";
+}
+
+std::string ReadMark(const Json::Value& data, const char* name, const char* otherwise) {
+  const std::string mark = OptionalText(data, name).value_or(otherwise);
+  if (mark.size() > kMarkMaxBytes) Refuse("\"" + std::string(name) + "\" must be a text of at most 64 bytes");
+  return mark;
+}
+
+SearchRequest ReadSearch(const Json::Value& data) {
+  SearchRequest request;
+  request.offset = OptionalInt(data, "offset", 0, 0, kLastHitMax);
+  request.limit = OptionalInt(data, "limit", 20, 0, kLimitMax);
+  if (request.offset + request.limit > kLastHitMax) {
+    Refuse("only the first " + std::to_string(kLastHitMax) + " hits can be shown; narrow the query");
+  }
+  request.sort = ReadSort(data);
+  request.ascending = ReadAscending(data, request.sort);
+  request.snippet = OptionalBool(data, "snippet", true);
+  request.mark_start = ReadMark(data, "mark_start", "[");
+  request.mark_end = ReadMark(data, "mark_end", "]");
+  return request;
+}
+
+/// The indices that are asked: one, several, or all that are not paused.
+std::vector<Registry::OpenIndex> ReadIndices(CommandCall& call) {
+  std::vector<std::string> ids;
+  const Json::Value& named = call.data["ids"];
+  if (call.data.isMember("id")) ids.push_back(RequiredText(call.data, "id"));
+  if (!IsJsonArray(named)) Refuse("\"ids\" must be an array of index ids");
+  for (const Json::Value& id : named) {
+    if (!id.isString()) Refuse("\"ids\" must be an array of index ids");
+    ids.push_back(id.asString());
+  }
+  std::vector<Registry::OpenIndex> indices;
+  for (const std::string& id : ids) indices.push_back(call.registry.Open(id));
+  if (!ids.empty() || named.isArray()) return indices;
+  for (const Registry::Listed& listed : call.registry.List()) {
+    try {
+      if (!listed.paused) indices.push_back(call.registry.Open(listed.id));
+    } catch (const Error&) {
+      // Logged where it arose; one unusable index does not hide the others' hits.
+    }
+  }
+  return indices;
+}
+
+/// Whether `a` comes before `b` in the reply.
+bool ComesFirst(const SearchRequest& request, const IndexHit& a, const IndexHit& b) {
+  const SearchHit& first = request.ascending ? a.hit : b.hit;
+  const SearchHit& second = request.ascending ? b.hit : a.hit;
+  if (request.sort == SortKey::kRelevance) return first.score < second.score;
+  if (request.sort == SortKey::kName) return CompareNames(first.name_key, second.name_key) < 0;
+  return first.number_key < second.number_key;
+}
+
+Json::Value HitJson(IndexHit& found) {
+  Json::Value hit;
+  hit["id"] = found.index_id;
+  hit["doc_id"] = found.hit.path;
+  hit["score"] = found.hit.score;
+  if (!found.hit.snippet.empty()) hit["snippet"] = found.hit.snippet;
+  hit["fields"] = std::move(found.hit.fields);
+  return hit;
+}
+
+/// The page of a search over several indices: the best of each, merged.
+std::vector<IndexHit> SearchAll(const std::vector<Registry::OpenIndex>& indices, const SearchRequest& request,
+                                SearchReply& sums) {
+  SearchRequest each = request;
+  if (indices.size() > 1) {
+    each.offset = 0;
+    each.limit = request.offset + request.limit;
+  }
+  std::vector<IndexHit> hits;
+  for (const Registry::OpenIndex& open : indices) {
+    SearchReply reply = open.index->Search(each);
+    sums.total += reply.total;
+    sums.ranking_bounded = sums.ranking_bounded || reply.ranking_bounded;
+    for (SearchHit& hit : reply.hits) hits.push_back({open.id, std::move(hit)});
+    for (std::string& word : reply.suggestions) sums.suggestions.push_back(std::move(word));
+  }
+  if (indices.size() <= 1) return hits;
+  std::stable_sort(hits.begin(), hits.end(),
+                   [&request](const IndexHit& a, const IndexHit& b) { return ComesFirst(request, a, b); });
+  const size_t first = std::min(hits.size(), static_cast<size_t>(request.offset));
+  const size_t end = std::min(hits.size(), first + static_cast<size_t>(request.limit));
+  return {std::make_move_iterator(hits.begin() + static_cast<ptrdiff_t>(first)),
+          std::make_move_iterator(hits.begin() + static_cast<ptrdiff_t>(end))};
+}
+
+}  // namespace
+
+Json::Value RunSearch(CommandCall& call) {
+  const auto began = std::chrono::steady_clock::now();
+  SearchRequest request = ReadSearch(call.data);
+  const QueryNode query = ParseQuery(RequiredText(call.data, "query"), Clock::Get().Now());
+  request.query = &query;
+  SearchReply sums;
+  std::vector<IndexHit> hits = SearchAll(ReadIndices(call), request, sums);
+  Json::Value result;
+  result["total"] = Json::Int64(sums.total);
+  result["ranking_bounded"] = sums.ranking_bounded;
+  result["hits"] = Json::Value(Json::arrayValue);
+  for (IndexHit& hit : hits) result["hits"].append(HitJson(hit));
+  if (sums.total == 0 && !sums.suggestions.empty()) {
+    result["suggestions"] = Json::Value(Json::arrayValue);
+    std::sort(sums.suggestions.begin(), sums.suggestions.end());
+    sums.suggestions.erase(std::unique(sums.suggestions.begin(), sums.suggestions.end()), sums.suggestions.end());
+    for (const std::string& word : sums.suggestions) result["suggestions"].append(word);
+  }
+  const auto took = std::chrono::steady_clock::now() - began;
+  result["took_us"] = Json::Int64(std::chrono::duration_cast<std::chrono::microseconds>(took).count());
+  return result;
+}
+
+}  // namespace ferrox::engine

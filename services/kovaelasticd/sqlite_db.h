@@ -1,0 +1,92 @@
+#pragma once
+
+#include <sqlite3.h>
+
+#include <cstdint>
+#include <memory>
+#include <string>
+#include <string_view>
+#include <unordered_map>
+
+namespace ferrox::engine {
+
+class Database;
+
+/// A prepared statement, borrowed from its database's cache while this lives. Parameters count from 1, columns from 0.
+/// Texts are bound without a copy: they must outlive the stepping.
+class Statement {
+ public:
+  Statement(Database& database, sqlite3_stmt* statement) : database_(&database), statement_(statement) {}
+  Statement(Statement&& other) noexcept : database_(other.database_), statement_(other.statement_) {
+    other.statement_ = nullptr;
+  }
+  Statement(const Statement&) = delete;
+  Statement& operator=(const Statement&) = delete;
+  ~Statement();
+
+  Statement& Bind(int index, int64_t value);
+  Statement& Bind(int index, double value) = delete;
+  Statement& Bind(int index, std::string_view text);
+  Statement& BindBlob(int index, std::string_view bytes);
+  Statement& BindNull(int index);
+  /// Lends an object to a function of ours, which asks for it by `type`.
+  Statement& BindPointer(int index, void* object, const char* type);
+
+  /// Goes to the next row; false after the last. @throws Error kEngineStorage.
+  bool Step();
+  /// Runs a statement that returns no rows, and makes it ready for other parameters.
+  void Run();
+  void Reset();
+
+  int64_t Int(int column) const { return sqlite3_column_int64(statement_, column); }
+  bool IsNull(int column) const { return sqlite3_column_type(statement_, column) == SQLITE_NULL; }
+  /// Valid until the next step.
+  std::string_view Text(int column) const;
+
+ private:
+  Database* database_;
+  sqlite3_stmt* statement_;
+};
+
+/// One connection to one database file. For one thread at a time.
+class Database {
+ public:
+  enum class Mode { kCreate, kWrite, kRead };
+
+  /// @throws Error kEngineStorage with the file's name, the cause and the remedy, as every member does.
+  Database(const std::string& path, Mode mode);
+  Database(const Database&) = delete;
+  Database& operator=(const Database&) = delete;
+  ~Database();
+
+  /// The statement for `sql`, which must be a literal or live as long as the database; prepared once.
+  Statement Prepare(const char* sql);
+  /// The same for a text that is built at run time.
+  Statement Prepare(const std::string& sql);
+  void Execute(const char* sql);
+  void Execute(const std::string& sql) { Execute(sql.c_str()); }
+  int64_t QueryInt(const char* sql);
+
+  sqlite3* Handle() { return handle_.get(); }
+  const std::string& Path() const { return path_; }
+  /// Logs and throws what the last call's result means for the index.
+  [[noreturn]] void Fail(int result);
+  void Check(int result) {
+    if (result != SQLITE_OK) [[unlikely]]
+      Fail(result);
+  }
+
+ private:
+  struct Closer {
+    void operator()(sqlite3* handle) const { (void)sqlite3_close_v2(handle); }
+  };
+  struct Finalizer {
+    void operator()(sqlite3_stmt* statement) const { (void)sqlite3_finalize(statement); }
+  };
+
+  std::string path_;
+  std::unique_ptr<sqlite3, Closer> handle_;
+  std::unordered_map<std::string, std::unique_ptr<sqlite3_stmt, Finalizer>> statements_;
+};
+
+}  // namespace ferrox::engine

@@ -1,0 +1,73 @@
+#pragma once
+
+#include <cstdint>
+#include <string>
+#include <vector>
+
+#include "services/kovaelasticd/doc_set.h"
+#include "services/kovaelasticd/fts.h"
+#include "services/kovaelasticd/snippet.h"
+#include "services/kovaelasticd/sqlite_store.h"
+
+namespace ferrox::engine {
+
+/// One search over one snapshot of an index: finds the set of documents, orders the best of them, loads a page.
+class Searcher {
+ public:
+  Searcher(StoreReader& reader, const SearchRequest& request) : reader_(reader), request_(request) {}
+  SearchReply Run();
+
+ private:
+  /// A word that documents are ranked by, and where it was found.
+  struct Term {
+    double weight = 0;  ///< the rarer, the more
+    std::vector<WordHit> content;
+    std::vector<WordHit> meta;
+  };
+  struct Ranked {
+    explicit Ranked(int64_t document) : id(document) {}
+    int64_t id;
+    double score = 0;
+    double place_score = 0;   ///< the part for words beside the content
+    size_t first_counts = 0;  ///< where its words' numbers of occurrences begin
+    int64_t number_key = 0;   ///< date or size
+    std::string name_key;
+  };
+
+  // Which documents.
+  DocSet Evaluate(const QueryNode& node, bool ranking);
+  DocSet EvaluateAll(const QueryNode& node, bool ranking);
+  DocSet EvaluateWords(const QueryNode& node, bool ranking);
+  DocSet EvaluateFilter(const QueryNode& node);
+  DocSet AllDocuments();
+  void ApplyFilter(DocSet& documents, const QueryNode& filter, bool wanted);
+  bool MatchesFilter(int64_t id, const QueryNode& filter);
+  void CollectWords(const QueryNode& node, HitCollector& content, HitCollector& meta);
+
+  // In which order.
+  std::vector<Ranked> RankByRelevance(const DocSet& documents, int64_t total, bool& bounded);
+  std::vector<int64_t> RankedCandidates(const DocSet& documents, int64_t total, bool& bounded);
+  template <typename Take>
+  static void ForEachCandidateHit(const std::vector<Ranked>& candidates, const std::vector<WordHit>& hits, Take take);
+  void AddScores(std::vector<Ranked>& candidates, size_t top);
+  double LengthFactor(int64_t id, double& freshness);
+  std::vector<Ranked> OrderByColumn(const DocSet& documents, int64_t total);
+  std::vector<Ranked> OrderFetched(const DocSet& documents);
+  std::vector<Ranked> OrderByWalk(const DocSet& documents);
+  size_t Needed() const { return static_cast<size_t>(request_.offset + request_.limit); }
+
+  // What is shown.
+  SearchHit LoadHit(const Ranked& ranked);
+  std::vector<std::string> Suggest();
+  std::vector<std::string> SuggestWord(const std::string& word);
+
+  StoreReader& reader_;
+  const SearchRequest& request_;
+  std::vector<Term> terms_;
+  std::vector<std::string> words_;   ///< those looked for, for suggestions
+  std::vector<SnippetWord> marked_;  ///< those marked in snippets
+  int64_t documents_ = 0;
+  double average_text_ = 1;
+};
+
+}  // namespace ferrox::engine

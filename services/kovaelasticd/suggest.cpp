@@ -1,0 +1,92 @@
+#include <algorithm>
+#include <cstdlib>
+
+#include "services/kovaelasticd/sqlite_search.h"
+
+namespace ferrox::engine {
+
+namespace {
+
+constexpr size_t kSuggestedMax = 3;
+constexpr size_t kShortestWord = 3;
+
+/// The number of letters to insert, remove, change or swap with the next; `limit` + 1 when there are more.
+size_t EditDistance(std::string_view a, std::string_view b, size_t limit) {
+  if (a.size() > b.size()) std::swap(a, b);
+  if (b.size() - a.size() > limit) return limit + 1;
+  std::vector<size_t> before_last(a.size() + 1);
+  std::vector<size_t> last(a.size() + 1);
+  std::vector<size_t> row(a.size() + 1);
+  for (size_t i = 0; i <= a.size(); ++i) last[i] = i;
+  for (size_t j = 1; j <= b.size(); ++j) {
+    row[0] = j;
+    for (size_t i = 1; i <= a.size(); ++i) {
+      const size_t change = a[i - 1] == b[j - 1] ? 0 : 1;
+      row[i] = std::min({last[i] + 1, row[i - 1] + 1, last[i - 1] + change});
+      const bool swapped = i > 1 && j > 1 && a[i - 1] == b[j - 2] && a[i - 2] == b[j - 1];
+      if (swapped) row[i] = std::min(row[i], before_last[i - 2] + 1);
+    }
+    before_last.swap(last);
+    last.swap(row);
+  }
+  return std::min(last[a.size()], limit + 1);
+}
+
+}  // namespace
+
+/// Known words like `word`, with the same first letter: the nearest first, then those in the most documents.
+std::vector<std::string> Searcher::SuggestWord(const std::string& word) {
+  struct Candidate {
+    size_t distance;
+    int64_t documents;
+    std::string word;
+  };
+  if (word.size() < kShortestWord) return {};
+  const size_t limit = word.size() < 6 ? 1 : 2;
+  std::vector<Candidate> candidates;
+  Statement statement =
+      reader_.database.Prepare("SELECT word, documents FROM suggestions WHERE word >= ?1 AND word < ?2");
+  PrefixRange(word.substr(0, 1)).Bind(statement);
+  while (statement.Step()) {
+    const size_t distance = EditDistance(word, statement.Text(0), limit);
+    if (distance == 0 || distance > limit) continue;
+    candidates.push_back({distance, statement.Int(1), std::string(statement.Text(0))});
+  }
+  const size_t count = std::min(candidates.size(), kSuggestedMax);
+  std::partial_sort(candidates.begin(), candidates.begin() + static_cast<ptrdiff_t>(count), candidates.end(),
+                    [](const Candidate& a, const Candidate& b) {
+                      return a.distance != b.distance ? a.distance < b.distance : a.documents > b.documents;
+                    });
+  std::vector<std::string> words;
+  for (size_t i = 0; i < count; ++i) words.push_back(candidates[i].word);
+  return words;
+}
+
+std::vector<std::string> Searcher::Suggest() {
+  std::vector<std::string> suggestions;
+  for (const std::string& word : words_) {
+    for (std::string& similar : SuggestWord(word)) {
+      if (suggestions.size() < kSuggestedMax) suggestions.push_back(std::move(similar));
+    }
+  }
+  return suggestions;
+}
+
+void SqliteStore::RebuildSuggestions() {
+  Begin();
+  Flush();
+  writer_.Execute(
+      "CREATE VIRTUAL TABLE IF NOT EXISTS temp.content_words USING fts5vocab('main', 'content_fts', 'row')");
+  writer_.Execute("CREATE VIRTUAL TABLE IF NOT EXISTS temp.meta_words USING fts5vocab('main', 'meta_fts', 'col')");
+  writer_.Execute("DELETE FROM suggestions");
+  // Words in the most documents, from names and titles too; a single occurrence is as likely an error itself.
+  writer_.Execute(
+      "INSERT OR IGNORE INTO suggestions SELECT term, doc FROM temp.content_words"
+      " WHERE doc > 1 AND length(term) BETWEEN 4 AND 24 AND term NOT GLOB '[0-9]*' ORDER BY doc DESC LIMIT 50000");
+  writer_.Execute(
+      "INSERT OR IGNORE INTO suggestions SELECT term, doc FROM temp.meta_words WHERE col IN ('name', 'title')"
+      " AND length(term) BETWEEN 4 AND 24 AND term NOT GLOB '[0-9]*' ORDER BY doc DESC LIMIT 10000");
+  uncommitted_bytes_ += 1;
+}
+
+}  // namespace ferrox::engine
