@@ -258,6 +258,9 @@ TEST_F(ContentExtractTest, TheStampFollowsTheFile) {
   WriteFile(dir_ / "a", "1");
   const string first = Parse("a", false)["_KOVAStamp"].asString();
   EXPECT_EQ(first, Parse("a", true)["_KOVAStamp"].asString());
+  struct stat status = {};
+  ASSERT_EQ(lstat((dir_ / "a").c_str(), &status), 0);
+  EXPECT_EQ(first, KOVA::CONTENT_EXTRACT::Stamp(status));
   WriteFile(dir_ / "a", "22");
   const string longer = Parse("a", false)["_KOVAStamp"].asString();
   EXPECT_NE(first, longer);

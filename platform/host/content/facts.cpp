@@ -4,10 +4,10 @@
 
 #include <algorithm>
 #include <cerrno>
-#include <cinttypes>
-#include <cstdio>
 #include <cstring>
 #include <stdexcept>
+
+#include "platform/host/content/stamp.h"
 
 namespace kova::content {
 
@@ -26,15 +26,9 @@ std::string ExtensionOf(const std::string& name) {
   return extension;
 }
 
-int64_t Nanoseconds(const statx_timestamp& time) { return time.tv_sec * INT64_C(1000000000) + time.tv_nsec; }
-
-/// Differs when size, content, attributes or the file itself do.
 std::string Stamp(const struct statx& info) {
-  char text[96];
-  (void)snprintf(text, sizeof(text), "%" PRIu64 ".%" PRId64 ".%" PRId64 ".%" PRIu64,
-                 static_cast<uint64_t>(info.stx_size), Nanoseconds(info.stx_mtime), Nanoseconds(info.stx_ctime),
-                 static_cast<uint64_t>(info.stx_ino));
-  return text;
+  return StampText(info.stx_size, Nanoseconds(info.stx_mtime.tv_sec, info.stx_mtime.tv_nsec),
+                   Nanoseconds(info.stx_ctime.tv_sec, info.stx_ctime.tv_nsec), info.stx_ino);
 }
 
 void AddSizesAndDates(const struct statx& info, Json::Value& document) {
