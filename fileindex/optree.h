@@ -5,6 +5,7 @@
 #include <iosfwd>
 #include <memory>
 #include <string>
+#include <string_view>
 #include <vector>
 
 #include <json/value.h>
@@ -15,7 +16,11 @@
 /// operations as give the same end state. The line's format is described in docs/formats/queue.md.
 namespace ferrox::fileindex {
 
+class OPArena;
+class OPTree;
+struct EventFields;
 struct OP;
+struct OPBranch;
 struct OPNode;
 
 /// Bits of a queue line's "event", in the order in which they are handled.
@@ -74,7 +79,7 @@ struct FERROX_EXPORT OP {
 
 /// One component of a path. `children` and `ops` are for reading; the tree alone changes them.
 struct FERROX_EXPORT OPNode : std::enable_shared_from_this<OPNode> {
-  OPNode(std::shared_ptr<OPNode> parent, const std::string& name);
+  OPNode(std::shared_ptr<OPNode> parent, std::string name);
   OPNode(const OPNode&) = delete;
   OPNode& operator=(const OPNode&) = delete;
   ~OPNode();
@@ -90,6 +95,17 @@ struct FERROX_EXPORT OPNode : std::enable_shared_from_this<OPNode> {
   std::shared_ptr<OPNode> parent;                 ///< null at the root
   std::vector<std::shared_ptr<OPNode>> children;  ///< in order of creation
   std::vector<std::shared_ptr<OP>> ops;           ///< in order of insertion, cancelled ones included
+
+ private:
+  friend class OPTree;
+
+  OPNode& ChildOf(std::string_view child_name, OPArena* arena);
+  bool MayHold(int live_class) const { return (live_ & (1u << live_class)) != 0; }
+
+  std::unique_ptr<OPBranch> branch_;  // once there are children
+  uint32_t position_ = 0;             // among the parent's children
+  uint32_t settled_ : 30 = 0;         // as many entries at the front of `ops` are cancelled or renames: no rule applies
+  uint32_t live_ : 2 = 0;             // bits: an operation of that class may be pending here or below
 };
 
 /// Reads one queue file whole and folds its events. Belongs to one caller and takes no locks. Nodes and operations that
@@ -129,6 +145,44 @@ class FERROX_EXPORT OPTree {
   std::string queue_path;
   std::shared_ptr<OPNode> root;
   std::vector<std::shared_ptr<OP>> ops;  ///< every operation ever queued, in order
+
+ private:
+  /// Classes of pending operations by who looks for them below a folder. A node's bit of a class is set whenever it or
+  /// a node below it holds such an operation, and perhaps for some time longer; each node with the bit is in its
+  /// parent's list of that class. So a folder's event visits only what may concern it, not the idle nodes beside.
+  enum LiveClass : int { kCancellable = 0, kMovable = 1, kEveryNode };
+  enum Handler : int;
+  struct Step {
+    size_t end;  // where the component ends in trail_path_
+    OPNode* node;
+  };
+
+  void InsertLine(std::string_view line);
+  void Insert(const EventFields& event, const Json::Value& data);
+  void Dispatch(OPNode& node, const std::shared_ptr<OP>& op, const EventFields& event, const Json::Value& data);
+  OPNode& FindNode(std::string_view path);
+  std::shared_ptr<OP> TakeSpareOP(OPNode& node);
+  void BreakCycles() noexcept;
+
+  void Fold(OPNode& node, Handler handler, const std::shared_ptr<OP>& op);
+  void Reindex(OPNode& node, const std::shared_ptr<OP>& op);
+  void Rename(OPNode& node, const std::shared_ptr<OP>& op);
+  void MoveBelow(OPNode& old_node, const std::string& old_path, const std::string& new_path);
+  bool CanAffordIdle(OPNode& old_node);
+  void MoveAlong(OPNode& node, const std::string& old_path, const std::string& new_path, bool with_idle);
+  void Queue(OPNode& node, const std::shared_ptr<OP>& op);
+
+  static FileIndexOP MoveOwn(OPNode& from, OPNode& to);
+  static void Take(OPNode& to, const std::vector<std::shared_ptr<OP>>& moved);
+  static void Mark(OPNode& node, FileIndexOP op);
+  static std::vector<OPNode*> NodesBelow(OPNode& top, LiveClass live_class);
+  static void Unmark(OPNode& top, const std::vector<OPNode*>& below, LiveClass live_class);
+
+  OPArena* arena_;
+  std::shared_ptr<OP> spare_;  // made for an event that needed none in the end
+  std::string trail_path_;     // the last path that was found, and the nodes on the way to it
+  std::vector<Step> trail_;
+  size_t idle_budget_ = 10000;  // nodes that renames may still visit though nothing is pending there
 };
 
 /// Text forms for logs: "[05] /old -> /new", "[04] /a, data={...}", "[02] /a"; a node is its name and its operations,

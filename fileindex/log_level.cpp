@@ -1,0 +1,7 @@
+#include "fileindex/util.h"
+
+namespace ferrox::fileindex {
+
+int log_level = 0;
+
+}  // namespace ferrox::fileindex

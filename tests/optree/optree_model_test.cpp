@@ -1,0 +1,119 @@
+#include "tests/support/optree_model.h"
+
+#include <random>
+
+#include <gtest/gtest.h>
+
+#include "common/error.h"
+#include "common/new_class.h"
+#include "tests/support/queue_lines.h"
+#include "tests/support/temp_dir.h"
+
+namespace ferrox::test {
+
+namespace {
+
+using fileindex::Event;
+using fileindex::OPTree;
+
+/// Every kind of line for `path`, alone and combined, and renames to it from each of `others`, itself among them.
+std::vector<std::string> LinesFor(const std::string& path, const std::vector<std::string>& others) {
+  std::vector<std::string> lines;
+  for (const uint32_t event : {0x40u, 0x4u, 0x2u, 0x80u, 0x10000u, 0x6u, 0x10080u}) lines.push_back(Line(event, path));
+  for (const uint32_t event : {0x40u, 0x84u}) lines.push_back(Line(event, path, "", true));
+  lines.push_back(UpdateCfg(path, "audio"));
+  for (const std::string& other : others) lines.push_back(Line(0x100u, path, other));
+  for (const uint32_t event : {0x104u, 0x10102u}) lines.push_back(Line(event, path, others.front()));
+  return lines;
+}
+
+std::vector<std::shared_ptr<Event>> EventsOn(const std::vector<std::string>& paths) {
+  std::vector<std::shared_ptr<Event>> events;
+  for (const std::string& path : paths) {
+    for (const std::string& line : LinesFor(path, paths)) events.push_back(newClass<Event>(line));
+  }
+  return events;
+}
+
+class OPTreeModelTest : public testing::Test {
+ protected:
+  OPTreeModelTest() { WriteFile(dir_ / "empty", ""); }
+
+  testing::AssertionResult Agree(const std::vector<std::shared_ptr<Event>>& events) {
+    OPTree tree(dir_ / "empty");
+    ListModel model;
+    for (const auto& event : events) {
+      model.Insert(*event);
+      try {
+        tree.InsertEvent(event);
+      } catch (const Error&) {
+      }
+    }
+    const std::string got = TextOf(tree);
+    if (got == model.Text()) return testing::AssertionSuccess();
+    auto failure = testing::AssertionFailure();
+    for (const auto& event : events) {
+      failure << std::hex << event->event << (event->is_dir ? " dir " : " ") << event->path_old << " -> " << event->path
+              << "\n";
+    }
+    return failure << "got\n" << got << "\nexpected\n" << model.Text();
+  }
+
+  TempDir dir_;
+};
+
+TEST_F(OPTreeModelTest, EverySequenceOfUpToThreeEventsOnThreePaths) {
+  for (const auto& paths : {std::vector<std::string>{"/a", "/a/b", "/c"}, {"/a/b", "/a/b/b", "/a"}}) {
+    const auto events = EventsOn(paths);
+    for (const auto& first : events) {
+      ASSERT_TRUE(Agree({first}));
+      for (const auto& second : events) {
+        ASSERT_TRUE(Agree({first, second}));
+      }
+    }
+    for (const auto& first : events) {
+      for (const auto& second : events) {
+        for (const auto& third : events) ASSERT_TRUE(Agree({first, second, third}));
+      }
+    }
+  }
+}
+
+TEST_F(OPTreeModelTest, LongRandomSequences) {
+  const unsigned seed = std::random_device()();
+  SCOPED_TRACE("seed " + std::to_string(seed));
+  std::mt19937 random(seed);
+  const auto events = EventsOn({"/a", "/a/b", "/a/b/c", "/a/d", "/e", "/e/b", "/e/b/f"});
+  for (int round = 0; round < 2000; ++round) {
+    std::vector<std::shared_ptr<Event>> sequence;
+    for (int i = 0; i < 20; ++i) sequence.push_back(events[random() % events.size()]);
+    ASSERT_TRUE(Agree(sequence));
+  }
+}
+
+TEST_F(OPTreeModelTest, RandomSequencesAboveManyIdleNodes) {
+  const unsigned seed = std::random_device()();
+  SCOPED_TRACE("seed " + std::to_string(seed));
+  std::mt19937 random(seed);
+  std::vector<std::shared_ptr<Event>> idle;
+  for (int i = 0; i < 10100; ++i) {
+    idle.push_back(newClass<Event>(Modify("/a/b/" + std::to_string(i % 101) + "/" + std::to_string(i))));
+  }
+  idle.push_back(newClass<Event>(Reindex("/a/b")));
+  const auto events = EventsOn({"/a", "/a/b/1/1", "/a/b", "/a/d", "/e", "/e/b/1", "/e/b"});
+  for (int round = 0; round < 4; ++round) {
+    std::vector<std::shared_ptr<Event>> sequence = idle;
+    while (sequence.size() < idle.size() + 20) {
+      const auto& event = events[random() % events.size()];
+      // Of renames only those that a kernel makes.
+      if (event->path.rfind(event->path_old, 0) == 0 && !event->path_old.empty()) continue;
+      if (event->path_old.rfind(event->path, 0) == 0) continue;
+      sequence.push_back(event);
+    }
+    ASSERT_TRUE(Agree(sequence));
+  }
+}
+
+}  // namespace
+
+}  // namespace ferrox::test

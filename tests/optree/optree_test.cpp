@@ -1,0 +1,215 @@
+#include <sstream>
+
+#include <gtest/gtest.h>
+
+#include "common/error.h"
+#include "common/new_class.h"
+#include "tests/support/log_capture.h"
+#include "tests/support/queue_lines.h"
+#include "tests/support/temp_dir.h"
+
+namespace ferrox::test {
+
+namespace {
+
+using namespace fileindex;
+
+/// The operations that the lines come to, one a line.
+std::string Fold(const std::vector<std::string>& lines) {
+  const TempDir dir;
+  WriteQueue(dir / "queue", lines);
+  OPTree tree(dir / "queue");
+  std::ostringstream text;
+  tree.ProcessOP([&text](std::shared_ptr<OP> op) { text << op << "\n"; });
+  return text.str();
+}
+
+TEST(OPTreeTest, Folding) {
+  const struct {
+    const char* claim;
+    std::vector<std::string> lines;
+    const char* operations;
+  } kCases[] = {
+      {"an empty queue", {}, ""},
+      {"changes of one file are one upsert", {Create("/v/f"), Modify("/v/f"), Attr("/v/f")}, "[02] /v/f\n"},
+      {"a created file may have been indexed before", {Create("/v/f"), Delete("/v/f")}, "[01] /v/f\n"},
+      {"a file that comes back", {Delete("/v/f"), Create("/v/f")}, "[02] /v/f\n"},
+      {"a modify after a delete is dropped", {Delete("/v/f"), Modify("/v/f")}, "[01] /v/f\n"},
+      {"a delete stays beside a reindex", {Reindex("/v/f"), Delete("/v/f")}, "[06] /v/f\n[01] /v/f\n"},
+      {"flags add up",
+       {UpdateCfg("/v", "audio"), UpdateCfg("/v", "video"), UpdateCfg("/v", "audio", false)},
+       "[04] /v, data={\"audio\":true,\"document\":false,\"photo\":false,\"video\":true}\n"},
+      {"a folder's creation is a reindex", {Line(EVENT_CREATE, "/v/d", "", true)}, "[06] /v/d\n"},
+      {"a reindex covers what lies below",
+       {Create("/v/a/x"), Rename("/v/o", "/v/a/r"), Create("/v/a/y/z"), Create("/v/ab"), Reindex("/v/a")},
+       "[05] /v/o -> /v/a/r\n[02] /v/ab\n[06] /v/a\n"},
+      {"a dropped reindex covers it too", {Delete("/v/a"), Create("/v/a/x"), Reindex("/v/a")}, "[01] /v/a\n"},
+      {"content work follows the rename", {Modify("/a/f"), Rename("/a/f", "/a/g")}, "[05] /a/f -> /a/g\n[02] /a/g\n"},
+      {"a folder's rename takes all but deletes along",
+       {Modify("/a/b/f"), Delete("/a/b/g"), Rename("/a", "/z")},
+       "[02] /z/b/f\n[01] /a/b/g\n[05] /a -> /z\n"},
+      {"both bits on one line come to nothing", {Line(EVENT_ATTR | EVENT_MODIFY, "/v/f")}, ""},
+      {"a rename into itself ends", {Modify("/a/f"), Rename("/a", "/a/b")}, "[02] /a/b/f\n[05] /a -> /a/b\n"},
+  };
+  for (const auto& test : kCases) EXPECT_EQ(Fold(test.lines), test.operations) << test.claim;
+}
+
+TEST(OPTreeTest, BadLinesAreLoggedAndSkipped) {
+  const LogCapture log;
+  const std::string huge = Create("/" + std::string(2 * kQueueLineMaxBytes, 'x'));
+  EXPECT_EQ(Fold({"{half", Create("/v/a"), huge, std::string(50, '\0'), Create("/v/b/"), Create("v"),
+                  Rename("", "/v/c"), "", Create("/v/d")}),
+            "[02] /v/a\n[02] /v/d\n");
+  const char* const logged[] = {
+      "InsertEvent failed, event_raw={half, code=906, reason=Malformed event_raw: {half",
+      "xxx..., code=906, reason=Malformed event_raw: {",
+      R"(event_raw=\x00\x00)",
+      "code=9999, reason=GetNodeByPath failed, path=/v/b/",
+      "(GetNodeByPath) Failed [",
+      "code=9999, reason=GetNodeByPath failed, path=",
+      "event_raw=, code=906",
+  };
+  for (const char* text : logged) EXPECT_TRUE(LogCapture::Contains(text)) << text;
+  EXPECT_FALSE(LogCapture::Contains("[err:"));
+}
+
+TEST(OPTreeTest, LastLineNeedsNoNewline) {
+  const TempDir dir;
+  WriteFile(dir / "queue", Create("/v/a") + "\n" + Create("/v/b"));
+  EXPECT_EQ(OPTree(dir / "queue").ProcessOP([](std::shared_ptr<OP>) {}), 2);
+}
+
+TEST(OPTreeTest, NothingCountsBesideACrash) {
+  const LogCapture log;
+  EXPECT_EQ(Fold({Create("/v/a"), Crash("/v"), Create("/v/b")}), "[07] \n");
+  EXPECT_TRUE(LogCapture::Contains("Queue crashed: "));
+}
+
+TEST(OPTreeTest, MissingQueue) {
+  const LogCapture log;
+  try {
+    OPTree tree("/nowhere/queue");
+    ADD_FAILURE();
+  } catch (const Error& error) {
+    EXPECT_EQ(error.Code(), Error::kInternal);
+    EXPECT_STREQ(error.what(), "Failed to open queue, reason=No such file or directory");
+  }
+  EXPECT_TRUE(LogCapture::Contains(" (BuildTree) Failed [!input_stream], reason: Failed to open queue"));
+}
+
+class OPTreeNodesTest : public testing::Test {
+ protected:
+  OPTreeNodesTest() { WriteFile(dir_ / "empty", ""); }
+
+  TempDir dir_;
+};
+
+TEST_F(OPTreeNodesTest, OnlyNormalizedPathsAreFoundButAllAreMade) {
+  const LogCapture log;
+  OPTree tree(dir_ / "empty");
+  for (const char* path : {"", "/", "a", "/a/", "/a//b", "//c"}) EXPECT_THROW(tree.GetNodeByPath(path), Error) << path;
+  ASSERT_EQ(tree.root->children.size(), 2u);
+  EXPECT_EQ(tree.root->children[0]->children[0]->GetPath(), "/a/b");
+  EXPECT_EQ(tree.GetNodeByPath("/a/b"), tree.root->children[0]->children[0]);
+  EXPECT_EQ(tree.root->GetPath(), "");
+}
+
+TEST_F(OPTreeNodesTest, ChildrenStayInOrderAndAreFoundAgain) {
+  OPTree tree(dir_ / "empty");
+  std::vector<std::shared_ptr<OPNode>> nodes;
+  for (int i = 0; i < 1000; ++i) nodes.push_back(tree.GetNodeByPath("/d/" + std::to_string(i * 7919 % 1000)));
+  EXPECT_EQ(nodes[0]->parent->children, nodes);
+  for (const auto& node : nodes) EXPECT_EQ(node->parent->GetChild(node->name), node);
+}
+
+TEST_F(OPTreeNodesTest, TraversalPassesANodeAfterThoseBelowIt) {
+  OPTree tree(dir_ / "empty");
+  for (const char* path : {"/a/b/c", "/a/d"}) tree.GetNodeByPath(path);
+  std::string passed;
+  const auto fn = [&passed](std::shared_ptr<OPNode> node) { passed += node->GetPath() + " "; };
+  tree.TraverseNodeDescendant(tree.GetNodeByPath("/a"), fn, true);
+  tree.TraverseNodeDescendant(tree.GetNodeByPath("/a/d"), fn, false);
+  EXPECT_EQ(passed, "/a/b/c /a/b /a/d /a/d ");
+}
+
+TEST_F(OPTreeNodesTest, KeptOperationsOutliveTheTree) {
+  std::shared_ptr<OP> kept;
+  {
+    WriteQueue(dir_ / "queue", {Create("/v/s/a"), Create("/v/s/b")});
+    OPTree tree(dir_ / "queue");
+    tree.ProcessOP([&kept](std::shared_ptr<OP> op) { kept = op; });
+  }
+  EXPECT_EQ(kept->node->GetPath(), "/v/s/b");
+  const std::weak_ptr<OPNode> root = kept->node->parent->parent->parent;
+  kept.reset();
+  EXPECT_TRUE(root.expired());
+}
+
+TEST_F(OPTreeNodesTest, DeepPathsNeedNoStack) {
+  std::string deep;
+  for (int i = 0; i < 100000; ++i) deep += "/d";
+  WriteQueue(dir_ / "queue", {Create(deep), Rename("/d", "/d/d"), Rename("/d", "/e"), Reindex("/e")});
+  std::shared_ptr<OPNode> kept;
+  {
+    OPTree tree(dir_ / "queue");
+    size_t passed = 0;
+    tree.TraverseNodeDescendant(
+        tree.root, [&passed](std::shared_ptr<OPNode>) { ++passed; }, false);
+    EXPECT_GT(passed, 200000u);
+    tree.ProcessOP([&kept](std::shared_ptr<OP> op) { kept = op->node; });
+    kept = tree.GetNodeByPath(deep);
+  }
+  EXPECT_EQ(kept->GetPath(), deep);
+}
+
+TEST_F(OPTreeNodesTest, FolderEventsVisitOnlyWhatIsPending) {
+  OPTree tree(dir_ / "empty");
+  for (int i = 0; i < 100000; ++i) tree.GetNodeByPath("/d/" + std::to_string(i));
+  for (int i = 0; i < 1000; ++i) {
+    const std::string from = i % 2 == 0 ? "/d" : "/e";
+    const std::string to = i % 2 == 0 ? "/e" : "/d";
+    tree.InsertEvent(newClass<Event>(Modify(from + "/" + std::to_string(i))));
+    tree.InsertEvent(newClass<Event>(Rename(from, to)));
+    tree.InsertEvent(newClass<Event>(Reindex(to)));
+  }
+  int upserts = 0;
+  tree.ProcessOP([&upserts](std::shared_ptr<OP> op) { upserts += op->op == OP_UPSERT; });
+  EXPECT_EQ(upserts, 0);
+}
+
+TEST_F(OPTreeNodesTest, TextForms) {
+  OPTree tree(dir_ / "empty");
+  const auto node = tree.GetNodeByPath("/v/a");
+  tree.InsertEvent(newClass<Event>(Create("/v/a")));
+  tree.InsertEvent(newClass<Event>(Rename("/v/o", "/v/a")));
+  std::ostringstream text;
+  text << node;
+  EXPECT_EQ(text.str(), "Node[a]: \n  [00] /v/a\n  [05] /v/o -> /v/a\n");
+  EXPECT_EQ(text.fill(), '0');
+}
+
+TEST(OPTest, MergeDataAddsFlags) {
+  Json::Value pending;
+  pending["audio"] = true;
+  pending["video"] = 1;
+  pending["path"] = "/a";
+  OP op(nullptr, OP_UPDATE_CFG, "", pending);
+  Json::Value incoming;
+  incoming["audio"] = false;
+  incoming["photo"] = 1;
+  op.MergeData(incoming);
+  EXPECT_EQ(toString(op.data), R"({"audio":true,"document":false,"path":"/a","photo":true,"video":false})");
+  for (const char* text : {"null", "3", "[true]", "\"audio\""}) {
+    Json::Value odd;
+    ASSERT_TRUE(fromString(odd, text));
+    op.MergeData(odd);
+    EXPECT_TRUE(op.data["photo"].asBool()) << text;
+    OP strange(nullptr, OP_UPDATE_CFG, "", odd);
+    strange.MergeData(incoming);
+    EXPECT_TRUE(strange.data["photo"].asBool()) << text;
+  }
+}
+
+}  // namespace
+
+}  // namespace ferrox::test
