@@ -1,0 +1,28 @@
+# What is installed: the two libraries, their headers below include/libfileindex, and what other projects find them by
+# (the CMake package "fileindex" and pkg-config's "libfileindex").
+include(CMakePackageConfigHelpers)
+
+set(package_folder ${CMAKE_INSTALL_LIBDIR}/cmake/fileindex)
+set(header_folder ${CMAKE_INSTALL_INCLUDEDIR}/libfileindex)
+
+install(TARGETS fileindex platform_host kova_interface EXPORT fileindexTargets
+        LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR})
+install(EXPORT fileindexTargets NAMESPACE fileindex:: DESTINATION ${package_folder})
+
+# Of the library's own headers, those that describe what libfileindex.so shows; the others are its own business.
+install(DIRECTORY ${CMAKE_SOURCE_DIR}/common ${CMAKE_SOURCE_DIR}/sdk DESTINATION ${header_folder}
+        FILES_MATCHING PATTERN "*.h")
+foreach(header optree queue_mgr status_mgr util elastic/comm elastic/elastic_control elastic/fields)
+  get_filename_component(folder fileindex/${header} DIRECTORY)
+  install(FILES ${CMAKE_SOURCE_DIR}/fileindex/${header}.h DESTINATION ${header_folder}/${folder})
+endforeach()
+install(DIRECTORY ${CMAKE_SOURCE_DIR}/platform/include/kova DESTINATION ${header_folder} FILES_MATCHING PATTERN "*.h")
+
+configure_package_config_file(${CMAKE_CURRENT_LIST_DIR}/fileindexConfig.cmake.in
+                              ${CMAKE_BINARY_DIR}/fileindexConfig.cmake INSTALL_DESTINATION ${package_folder})
+write_basic_package_version_file(${CMAKE_BINARY_DIR}/fileindexConfigVersion.cmake COMPATIBILITY SameMinorVersion)
+install(FILES ${CMAKE_BINARY_DIR}/fileindexConfig.cmake ${CMAKE_BINARY_DIR}/fileindexConfigVersion.cmake
+        DESTINATION ${package_folder})
+
+configure_file(${CMAKE_CURRENT_LIST_DIR}/libfileindex.pc.in ${CMAKE_BINARY_DIR}/libfileindex.pc @ONLY)
+install(FILES ${CMAKE_BINARY_DIR}/libfileindex.pc DESTINATION ${CMAKE_INSTALL_LIBDIR}/pkgconfig)
