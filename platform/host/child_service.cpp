@@ -7,6 +7,7 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <cerrno>
 #include <chrono>
 #include <cstdlib>
@@ -80,21 +81,22 @@ std::string FindProgram(const std::string& program) {
   return {};
 }
 
-/// The last line of a text file that is not empty.
-std::string LastLine(const std::string& path) {
+/// The last line that is not empty of what a text file holds from byte `from` on.
+std::string LastLine(const std::string& path, std::streamoff from) {
   constexpr std::streamoff kTailBytes = 4096;
   std::ifstream file(path, std::ios::binary | std::ios::ate);
   const std::streamoff size = file.tellg();
-  if (size > kTailBytes) {
-    (void)file.seekg(size - kTailBytes);
-  } else {
-    (void)file.seekg(0);
-  }
+  (void)file.seekg(std::max(from <= size ? from : 0, size - kTailBytes));
   std::string line, last;
   while (std::getline(file, line)) {
     if (!line.empty()) last = line;
   }
   return last;
+}
+
+std::streamoff FileSize(const std::string& path) {
+  struct stat info = {};
+  return stat(path.c_str(), &info) == 0 ? info.st_size : 0;
 }
 
 /// Keeps other processes from starting or stopping the same service.
@@ -117,20 +119,20 @@ class SwitchLock {
   Fd file_;
 };
 
-int Ended(const ServiceRow& service) {
+int Ended(const ServiceRow& service, std::streamoff log_from) {
   const std::string log_path = ServiceLogPath(service.program);
-  const std::string last = LastLine(log_path);
+  const std::string last = LastLine(log_path, log_from);
   return ServiceFailure(KOVA_ERR_SYSTEM, std::string(service.program) + " ended at once" +
                                              (last.empty() ? "" : ": " + last) + " (its log is " + log_path + ")");
 }
 
-/// Waits until the service is up. `pid` is the process that was started, 0 for one that somebody else had started.
-int WaitUntilReady(const ServiceRow& service, pid_t pid) {
-  const ProcessHandle process(pid != 0 ? pid : RunningPid(service));
+/// Waits until the service is up. `pid` is the process that is to become it; what it logs begins at byte `log_from`.
+int WaitUntilReady(const ServiceRow& service, pid_t pid, std::streamoff log_from) {
+  const ProcessHandle process(pid);
   const auto deadline = SteadyClock::now() + kStartMax;
   do {
     if (RunningPid(service) != 0 && Answers(service)) return 0;
-    if (process.WaitForEnd(kPollMs)) return RunningPid(service) != 0 && Answers(service) ? 0 : Ended(service);
+    if (process.WaitForEnd(kPollMs)) return RunningPid(service) != 0 && Answers(service) ? 0 : Ended(service, log_from);
   } while (SteadyClock::now() < deadline);
   return ServiceFailure(KOVA_ERR_SYSTEM, std::string(service.program) + " runs but does not answer after " +
                                              std::to_string(kStartMax.count()) + " s; see its log " +
@@ -176,10 +178,12 @@ int StartChildService(const ServiceRow& service) {
   (void)MakeFolders(InstanceRoot() + "/var/run", 0755);  // a failure shows as that of the lock
   SwitchLock lock(service);
   if (Prepare(service, lock) < 0) return -1;
-  if (RunningPid(service) != 0) return WaitUntilReady(service, 0);
-  const pid_t pid = StartDetached(program, ServiceLogPath(service.program));
+  const std::string log_path = ServiceLogPath(service.program);
+  const std::streamoff log_from = FileSize(log_path);
+  pid_t pid = RunningPid(service);
+  if (pid == 0) pid = StartDetached(program, log_path);
   if (pid < 0) return ServiceFailure(KOVA_ERR_SYSTEM, "cannot run " + program + ": " + strerror(errno));
-  return WaitUntilReady(service, pid);
+  return WaitUntilReady(service, pid, log_from);
 }
 
 int StopChildService(const ServiceRow& service) {
