@@ -55,7 +55,7 @@ bool CopyContent(int from, int to) {
 bool CopyAttributes(int to, const struct stat& info) {
   mode_t mode = info.st_mode & 07777;
   if (fchown(to, info.st_uid, info.st_gid) != 0) {
-    if (errno != EPERM) return false;
+    if (errno != EPERM && errno != EINVAL && errno != EOVERFLOW) return false;  // or an id that is unknown there
     mode &= ~static_cast<mode_t>(S_ISUID | S_ISGID);
     (void)!fchown(to, static_cast<uid_t>(-1), info.st_gid);  // a group that the user is in is better than none
   }

@@ -158,10 +158,15 @@ TEST_F(HostPlatformTest, PrivilegesFollowModeBits) {
 /// as root there, so that it may mount. False when this system does not let it.
 bool InChild(bool privately, const std::function<void()>& body) {
   const uid_t uid = geteuid();
+  const gid_t gid = getegid();
   const pid_t child = fork();
   if (child == 0) {
     if (privately && unshare(CLONE_NEWNS | (uid != 0 ? CLONE_NEWUSER : 0)) != 0) _exit(77);
-    if (privately && uid != 0) WriteFile("/proc/self/uid_map", "0 " + std::to_string(uid) + " 1");
+    if (privately && uid != 0) {
+      WriteFile("/proc/self/setgroups", "deny");
+      WriteFile("/proc/self/uid_map", "0 " + std::to_string(uid) + " 1");
+      WriteFile("/proc/self/gid_map", "0 " + std::to_string(gid) + " 1");
+    }
     if (privately && mount(nullptr, "/", nullptr, MS_REC | MS_PRIVATE, nullptr) != 0) _exit(77);
     body();
     _exit(testing::Test::HasFailure() ? 1 : 0);
