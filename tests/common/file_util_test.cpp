@@ -4,30 +4,21 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
-#include <filesystem>
-
-#include <gtest/gtest.h>
-
 #include <kova/fs.h>
 
-#include "common/error.h"
-#include "tests/support/fake_platform.h"
-#include "tests/support/temp_dir.h"
+#include "tests/support/library_test.h"
 
 namespace ferrox {
 
 namespace {
 
 namespace fs = std::filesystem;
-using test::FakePlatform;
 using test::ReadFile;
-using test::TempDir;
 using test::WriteFile;
 
-class FileUtilTest : public testing::Test {
+class FileUtilTest : public test::LibraryTest {
  protected:
-  void SetUp() override { FakePlatform::Get().Reset(); }
-  TempDir dir_;
+  test::TempDir dir_;
 };
 
 }  // namespace
@@ -40,24 +31,19 @@ TEST_F(FileUtilTest, PathsAreCutAtTheLastSlash) {
            Row{"/v/s/a.JPG", "a.JPG", "/v/s", "JPG", "jpg"},
            Row{"/a", "a", "", "", ""},
            Row{"bare", "bare", "bare", "", ""},
-           Row{"/v/s/", "", "/v/s", "", ""},
+           Row{"/v.d/", "", "/v.d", "", ""},
            Row{"/v.d/readme", "readme", "/v.d", "", ""},
            Row{"/v/.Hidden", ".Hidden", "/v", "Hidden", "hidden"},
            Row{"/v/a.tar.gz", "a.tar.gz", "/v", "gz", "gz"},
-           Row{"/v/end.", "end.", "/v", "", ""},
-           Row{"/v/x.\xc4\xd6Z", "x.\xc4\xd6Z", "/v", "\xc4\xd6Z", "\xc4\xd6z"},
-           Row{"", "", "", "", ""},
+           Row{"/v/x.\xc4Z", "x.\xc4Z", "/v", "\xc4Z", "\xc4z"},
        }) {
-    SCOPED_TRACE(row.path);
-    EXPECT_EQ(Basename(row.path), row.base);
-    EXPECT_EQ(Dirname(row.path), row.dirname);
-    EXPECT_EQ(GetFileExtension(row.path, false), row.extension);
-    EXPECT_EQ(GetFileExtension(row.path, true), row.lower);
+    EXPECT_EQ(Basename(row.path), row.base) << row.path;
+    EXPECT_EQ(Dirname(row.path), row.dirname) << row.path;
+    EXPECT_EQ(GetFileExtension(row.path, false), row.extension) << row.path;
+    EXPECT_EQ(GetFileExtension(row.path, true), row.lower) << row.path;
   }
-  EXPECT_TRUE(StringStartWith("abc", ""));
-  EXPECT_TRUE(StringStartWith("abc", "abc"));
-  EXPECT_FALSE(StringStartWith("ab", "abc"));
-  EXPECT_FALSE(StringStartWith("xabc", "abc"));
+  EXPECT_TRUE(StringStartWith("abc", "") && StringStartWith("abc", "abc"));
+  EXPECT_FALSE(StringStartWith("ab", "abc") || StringStartWith("xabc", "abc"));
 }
 
 TEST_F(FileUtilTest, KindsOfEntries) {
@@ -77,10 +63,9 @@ TEST_F(FileUtilTest, KindsOfEntries) {
         Row{"to_folder", false, false, true}, Row{"to_link", false, false, true}, Row{"loop", false, false, false},
         // A relative target counts from the working directory.
         Row{"relative", false, false, false}, Row{"missing", false, false, false}}) {
-    SCOPED_TRACE(row.name);
-    EXPECT_EQ(IsFileExist(dir_ / row.name), row.file);
-    EXPECT_EQ(IsDirExist(dir_ / row.name, false), row.folder);
-    EXPECT_EQ(IsDirExist(dir_ / row.name, true), row.folder_followed);
+    EXPECT_EQ(IsFileExist(dir_ / row.name), row.file) << row.name;
+    EXPECT_EQ(IsDirExist(dir_ / row.name, false), row.folder) << row.name;
+    EXPECT_EQ(IsDirExist(dir_ / row.name, true), row.folder_followed) << row.name;
   }
   dirent entry = {};
   for (const auto& [type, expected] : {std::pair{DT_DIR, true}, {DT_REG, false}, {DT_UNKNOWN, false}}) {
@@ -89,67 +74,44 @@ TEST_F(FileUtilTest, KindsOfEntries) {
   }
   EXPECT_EQ(RealPath(dir_ / "to_link/../folder/."), fs::canonical(dir_ / "folder").string());
   EXPECT_EQ(RealPath(dir_ / "missing"), "");
-}
-
-TEST_F(FileUtilTest, UnlinkOfAMissingFileIsNoFailure) {
-  WriteFile(dir_ / "file", "x");
-  EXPECT_TRUE(Unlink(dir_ / "file"));
-  EXPECT_TRUE(Unlink(dir_ / "file"));
-  EXPECT_FALSE(Unlink(dir_.Path()));
+  EXPECT_TRUE(Unlink(dir_ / "file") && Unlink(dir_ / "file")) << "what is missing is gone";
+  EXPECT_FALSE(Unlink(dir_ / "folder"));
 }
 
 TEST_F(FileUtilTest, PlatformAnswersArePassedOn) {
-  FakePlatform& platform = FakePlatform::Get();
-  platform.permissions = {{"/p", KOVA_PERM_READ | KOVA_PERM_EXECUTE}};
-  platform.mount_points = {"/mnt"};
+  platform_.permissions = {{"/p", KOVA_PERM_READ | KOVA_PERM_EXECUTE}};
+  platform_.mount_points = {"/mnt"};
   EXPECT_TRUE(CheckACLPerm("/p", KOVA_PERM_READ | KOVA_PERM_WRITE));
-  EXPECT_FALSE(CheckACLPerm("/p", KOVA_PERM_WRITE));
-  EXPECT_FALSE(CheckACLPerm("/no/such", KOVA_PERM_READ));
-  EXPECT_TRUE(IsMountPoint("/mnt"));
-  EXPECT_FALSE(IsMountPoint("/mnt/below"));
+  EXPECT_FALSE(CheckACLPerm("/p", KOVA_PERM_WRITE) || CheckACLPerm("/no/such", KOVA_PERM_READ));
+  EXPECT_TRUE(IsMountPoint("/mnt") && !IsMountPoint("/mnt/below"));
   WriteFile(dir_ / "a", "x");
-  EXPECT_TRUE(CPFile(dir_ / "a", dir_ / "b"));
-  EXPECT_TRUE(MVFile(dir_ / "a", dir_ / "c"));
+  EXPECT_TRUE(CPFile(dir_ / "a", dir_ / "b") && MVFile(dir_ / "a", dir_ / "c"));
   EXPECT_FALSE(MVFile(dir_ / "a", dir_ / "d"));
-  EXPECT_TRUE(platform.Called("KOVAFileCopy(" + dir_ / "a" + ", " + dir_ / "b" + ", 10, 1)"));
-  EXPECT_TRUE(platform.Called("KOVAFileCopy(" + dir_ / "a" + ", " + dir_ / "c" + ", 11, 1)"));
-}
-
-TEST_F(FileUtilTest, ChownNeedsThePackageUser) {
-  WriteFile(dir_ / "a", "x");
-  try {
-    (void)ChownFerrox(dir_ / "a");
-    FAIL() << "no such user, and no failure";
-  } catch (const Error& error) {
-    EXPECT_EQ(error.Code(), Error::kChownFailed);
-    EXPECT_STREQ(error.what(), "");
-  }
-  FakePlatform::Get().users["Ferrox"] = {getuid(), getgid(), false, "/", 0};
-  EXPECT_TRUE(ChownFerrox(dir_ / "a"));
+  EXPECT_TRUE(platform_.Called("KOVAFileCopy(" + dir_ / "a" + ", " + dir_ / "b" + ", 10, 1)"));
+  EXPECT_TRUE(platform_.Called("KOVAFileCopy(" + dir_ / "a" + ", " + dir_ / "c" + ", 11, 1)"));
+  EXPECT_EQ(test::FailureOf([&] { (void)ChownFerrox(dir_ / "c"); }), "801 ");
+  platform_.users["Ferrox"] = {getuid(), getgid(), false, "/", 0};
+  EXPECT_TRUE(ChownFerrox(dir_ / "c"));
   EXPECT_FALSE(ChownFerrox(dir_ / "missing"));
 }
 
 TEST_F(FileUtilTest, WholeFileIsTheOldOneOrTheNewOne) {
   const std::string path = dir_ / "f";
+  const auto mode = [&path] { return fs::status(path).permissions(); };
   std::string content;
   ASSERT_TRUE(WriteWholeFile(path, "old"));
-  struct stat status = {};
-  ASSERT_EQ(stat(path.c_str(), &status), 0);
-  EXPECT_EQ(status.st_mode & 0777, 0644U);
-  ASSERT_EQ(chmod(path.c_str(), 0600), 0);
+  EXPECT_EQ(mode(), fs::perms(0644));
+  fs::permissions(path, fs::perms(0600));
   ASSERT_TRUE(WriteWholeFile(path, std::string("n\0w", 3)));
-  ASSERT_EQ(stat(path.c_str(), &status), 0);
-  EXPECT_EQ(status.st_mode & 0777, 0600U) << "the mode stays";
-  EXPECT_TRUE(ReadWholeFile(path, content));
-  EXPECT_EQ(content, std::string("n\0w", 3));
+  EXPECT_EQ(mode(), fs::perms(0600)) << "the mode stays";
 
-  fs::create_directory(dir_ / "d");  // cannot be renamed over
-  WriteFile(dir_ / "d/in", "x");
+  WriteFile(dir_ / "d/in", "x");  // a folder cannot be renamed over
   EXPECT_FALSE(WriteWholeFile(dir_ / "d", "new"));
-  EXPECT_FALSE(IsFileExist(dir_ / "d.new")) << "nothing is left beside";
+  EXPECT_FALSE(fs::exists(dir_ / "d.new")) << "nothing is left beside";
   fs::create_directory(dir_ / "f.new");  // the file beside cannot be made
   EXPECT_FALSE(WriteWholeFile(path, "newer"));
-  EXPECT_EQ(ReadFile(path), std::string("n\0w", 3));
+  EXPECT_TRUE(ReadWholeFile(path, content));
+  EXPECT_EQ(content, std::string("n\0w", 3));
   EXPECT_FALSE(ReadWholeFile(dir_ / "d", content));
   ASSERT_EQ(mkfifo((dir_ / "fifo").c_str(), 0600), 0);
   EXPECT_FALSE(ReadWholeFile(dir_ / "fifo", content)) << "and does not wait for a writer";
@@ -161,9 +123,7 @@ TEST_F(FileUtilTest, KilledWritersLeaveNoHalfFile) {
   ASSERT_TRUE(WriteWholeFile(path, contents[0]));
   for (int round = 0; round < 20; ++round) {
     const pid_t writer = fork();
-    if (writer == 0) {
-      for (size_t i = 0;; ++i) (void)WriteWholeFile(path, contents[i % 2]);
-    }
+    for (size_t i = 0; writer == 0; ++i) (void)WriteWholeFile(path, contents[i % 2]);
     (void)usleep(static_cast<useconds_t>(500 * round));
     (void)kill(writer, SIGKILL);
     (void)waitpid(writer, nullptr, 0);

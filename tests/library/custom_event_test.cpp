@@ -1,56 +1,39 @@
 #include <sys/resource.h>
 
 #include <csignal>
-#include <filesystem>
-#include <functional>
+#include <memory>
 
-#include <gtest/gtest.h>
-#include <json/value.h>
-
-#include "common/error.h"
-#include "common/json_util.h"
 #include "common/lock_file.h"
-#include "common/paths.h"
 #include "fileindex/optree.h"
 #include "fileindex/status_mgr.h"
 #include "fileindex/util.h"
 #include "sdk/share.h"
-#include "tests/support/fake_clock.h"
-#include "tests/support/fake_platform.h"
-#include "tests/support/log_capture.h"
-#include "tests/support/temp_dir.h"
+#include "tests/support/library_test.h"
 
 namespace ferrox::fileindex {
 
 namespace {
 
-using test::FakePlatform;
+namespace fs = std::filesystem;
 using test::ReadFile;
 using test::WriteFile;
 
-int CodeOf(const std::function<void()>& call) {
-  try {
-    call();
-    return 0;
-  } catch (const Error& error) {
-    return error.Code();
-  }
-}
-
-class AddCustomEventTest : public testing::Test {
+class AddCustomEventTest : public test::LibraryTest {
  protected:
   void SetUp() override {
-    FakePlatform::Get().Reset();
-    FakePlatform::Get().shares["photo"] = {"/v/photo"};
+    platform_.Reset();
+    platform_.shares["photo"] = {"/v/photo"};
     queue_ = sdk::SDKShare("photo").GetQueuePath();
     for (const std::string& path : {queue_, queue_ + ".tmp", InstancePath(kFileIndexStatusCfgPath)}) {
-      (void)std::filesystem::remove(path);
+      (void)fs::remove(path);
     }
+  }
+  /// Queues a reindex; how that fails.
+  static std::string Add(const std::string& path, const Json::Value& data = {}) {
+    return test::FailureOf([&] { AddCustomEvent(EVENT_REINDEX, path, "", data); });
   }
 
   std::string queue_;
-  test::FakeClock clock_;
-  test::LogCapture log_;
 };
 
 }  // namespace
@@ -67,51 +50,48 @@ TEST_F(AddCustomEventTest, LinesHoldAllFourMembers) {
 }
 
 TEST_F(AddCustomEventTest, NothingIsQueuedBelowAQueuedReindex) {
-  AddCustomEvent(EVENT_REINDEX, "/v/photo/a", "", Json::Value());
+  EXPECT_EQ(Add("/v/photo/a"), "");
   const std::string queued = ReadFile(queue_);
-  AddCustomEvent(EVENT_REINDEX, "/v/photo/a/b", "", Json::Value());
+  EXPECT_EQ(Add("/v/photo/a/b"), "");
   AddCustomEvent(EVENT_UPDATE_CFG, "/v/photo/a", "", Json::Value(Json::objectValue));
   EXPECT_EQ(ReadFile(queue_), queued);
-  std::filesystem::rename(queue_, queue_ + ".tmp");  // being worked on counts as queued
-  AddCustomEvent(EVENT_REINDEX, "/v/photo/a", "", Json::Value());
-  EXPECT_FALSE(std::filesystem::exists(queue_));
-  AddCustomEvent(EVENT_REINDEX, "/v/photo/ab", "", Json::Value());
-  EXPECT_NE(ReadFile(queue_), "");
+  fs::rename(queue_, queue_ + ".tmp");  // being worked on counts as queued
+  EXPECT_EQ(Add("/v/photo/a"), "");
+  EXPECT_FALSE(fs::exists(queue_));
+  EXPECT_EQ(Add("/v/photo/ab"), "");
+  EXPECT_TRUE(fs::exists(queue_));
 }
 
 TEST_F(AddCustomEventTest, AHalfWrittenLineIsNotContinued) {
-  AddCustomEvent(EVENT_REINDEX, "/v/photo/a", "", Json::Value());
-  const std::string whole = ReadFile(queue_);
   const std::string half = R"({"event":64,"path":"/v/photo/x"})";
   WriteFile(queue_, half);
-  AddCustomEvent(EVENT_REINDEX, "/v/photo/a", "", Json::Value());
-  EXPECT_EQ(ReadFile(queue_), half + "\n" + whole);
+  EXPECT_EQ(Add("/v/photo/a"), "");
+  EXPECT_EQ(ReadFile(queue_).rfind(half + "\n{\"data\":null", 0), 0U);
 }
 
 TEST_F(AddCustomEventTest, FailuresMarkTheShare) {
-  const auto add = [] { AddCustomEvent(EVENT_REINDEX, "/v/photo/a", "", Json::Value()); };
-  const auto check = [this](int code, const std::string& share) {
-    EXPECT_EQ(StatusMgr().GetShareStatus(share), StatusMgr::kNeedReindex);
-    EXPECT_TRUE(log_.Contains("(AddCustomEvent) AddCustomEvent failed, code=" + std::to_string(code)));
-    EXPECT_NE(log_.Lines().back().find(". Set [" + share + "] need reindex"), std::string::npos) << log_.Lines().back();
-    SetUp();
+  struct Row {
+    const char *code, *path, *share;
+    std::function<void()> prepare;
+    Json::Value data = {};
   };
-  {
-    const LockFile held(queue_, true);
-    EXPECT_EQ(CodeOf(add), Error::kLockFailed);
+  std::unique_ptr<LockFile> held;
+  for (const Row& row : {
+           Row{"506", "/v/photo/a", "photo", [&] { held = std::make_unique<LockFile>(queue_, true); }},
+           Row{"906", "/v/photo/a", "photo", [&] { WriteFile(queue_, "no event\n"); }},
+           Row{"800", "/v/photo/a", "photo", [&] { platform_.failing["KOVAShareGet"] = {}; }},
+           Row{"502", "/elsewhere", "", [] {}},
+           Row{"502", "/v/photo/a", "photo", [] {}, std::string(kQueueLineMaxBytes, 'x')},
+       }) {
+    SetUp();
+    row.prepare();
+    EXPECT_EQ(Add(row.path, row.data).substr(0, 3), row.code);
+    EXPECT_EQ(StatusMgr().GetShareStatus(row.share), StatusMgr::kNeedReindex);
+    const std::string line = std::string("(AddCustomEvent) AddCustomEvent failed, code=") + row.code;
+    EXPECT_TRUE(log_.Contains(line)) << line;
+    EXPECT_TRUE(log_.Contains(std::string(". Set [") + row.share + "] need reindex"));
+    held.reset();
   }
-  check(506, "photo");
-  WriteFile(queue_, "no event\n");
-  EXPECT_EQ(CodeOf(add), Error::kMalformedEvent);
-  check(906, "photo");
-  FakePlatform::Get().failing["KOVAShareGet"] = {};
-  EXPECT_EQ(CodeOf(add), Error::kNoSuchShare);
-  check(800, "photo");
-  EXPECT_EQ(CodeOf([] { AddCustomEvent(EVENT_REINDEX, "/elsewhere", "", Json::Value()); }), Error::kInternal);
-  check(502, "");
-  const Json::Value huge = std::string(kQueueLineMaxBytes, 'x');
-  EXPECT_EQ(CodeOf([&huge] { AddCustomEvent(EVENT_UPDATE_CFG, "/v/photo/a", "", huge); }), Error::kInternal);
-  check(502, "photo");
 }
 
 // A limit on the size of files stands for the full disk: the write that reaches it is cut short.
@@ -125,7 +105,7 @@ TEST_F(AddCustomEventTest, AShortWriteIsTakenBack) {
   for (const rlim_t room : {before.size() + 10, before.size()}) {
     const struct rlimit tight = {room, unlimited.rlim_max};
     ASSERT_EQ(setrlimit(RLIMIT_FSIZE, &tight), 0);
-    EXPECT_EQ(CodeOf([] { AddCustomEvent(EVENT_REINDEX, "/v/photo/a", "", Json::Value()); }), Error::kInternal);
+    EXPECT_EQ(Add("/v/photo/a").substr(0, 3), "502");
     ASSERT_EQ(setrlimit(RLIMIT_FSIZE, &unlimited), 0);
     EXPECT_EQ(ReadFile(queue_), before);
     EXPECT_TRUE(log_.Contains("reason: Failed to write queue, reason="));

@@ -1,47 +1,23 @@
 #include "fileindex/elastic/elastic_control.h"
 
-#include <filesystem>
-#include <functional>
+#include <map>
 #include <set>
 #include <stdexcept>
 
-#include <gtest/gtest.h>
-
-#include "common/error.h"
-#include "common/json_util.h"
-#include "common/paths.h"
 #include "fileindex/elastic/fields.h"
 #include "fileindex/status_mgr.h"
-#include "tests/support/fake_clock.h"
-#include "tests/support/fake_platform.h"
-#include "tests/support/log_capture.h"
-#include "tests/support/temp_dir.h"
+#include "tests/support/library_test.h"
 
 namespace ferrox::fileindex::elastic {
 
 namespace {
 
-using test::FakePlatform;
+using test::FailureOf;
+using test::Parse;
 
-Json::Value Parse(const std::string& text) {
-  Json::Value value;
-  EXPECT_TRUE(fromString(value, text)) << text;
-  return value;
-}
-
-std::string Failure(const std::function<void()>& call) {
-  try {
-    call();
-    return {};
-  } catch (const Error& error) {
-    return std::to_string(error.Code()) + " " + error.what();
-  }
-}
-
-class ElasticControlTest : public testing::Test {
+class ElasticControlTest : public test::LibraryTest {
  protected:
   void SetUp() override {
-    platform_.Reset();
     platform_.shares["photo"] = {"/volume1/photo"};
     platform_.engine = [this](const std::string& request) {
       const Json::Value command = Parse(request)["command"];
@@ -59,10 +35,7 @@ class ElasticControlTest : public testing::Test {
     return lines;
   }
 
-  FakePlatform& platform_ = FakePlatform::Get();
   std::string below_ = R"({"success":true,"data":[]})";
-  test::FakeClock clock_;
-  test::LogCapture log_;
 };
 
 }  // namespace
@@ -141,7 +114,7 @@ TEST_F(ElasticControlTest, CommandsAndTheirRequests) {
   EXPECT_EQ(create["data"].getMemberNames(),
             (Json::Value::Members{"event_handler", "id", "mappings", "path", "settings"}));
   EXPECT_EQ(create["data"]["mappings"], GetFileIndexMappings());
-  EXPECT_EQ(Failure([] { ShareIndexCreate("nope"); }), "800 nope");
+  EXPECT_EQ(FailureOf([] { ShareIndexCreate("nope"); }), "800 nope");
 }
 
 TEST_F(ElasticControlTest, DocumentsAreBuiltByTheExtractor) {
@@ -161,7 +134,7 @@ TEST_F(ElasticControlTest, DocumentsAreBuiltByTheExtractor) {
            std::function<void(Json::Value&)>([](Json::Value& document) { document = "no object"; }),
        }) {
     platform_.parse_file = [&parse](const std::string&, const Json::Value&, Json::Value& d) { parse(d); };
-    EXPECT_EQ(Failure([] { IndexUpsert("photo", "/v/p/a", true); }), "914 Parse failed, path=/v/p/a");
+    EXPECT_EQ(FailureOf([] { IndexUpsert("photo", "/v/p/a", true); }), "914 Parse failed, path=/v/p/a");
   }
 }
 
@@ -206,28 +179,28 @@ TEST_F(ElasticControlTest, UnusableLists) {
   const auto list = [&paths] { IndexGetByPrefixPath("id", "/o", paths); };
   for (const char* reply : {R"({"success":true})", R"({"data":{},"success":true})", R"({"data":5,"success":true})"}) {
     below_ = reply;
-    EXPECT_EQ(Failure(rename), std::string("916 ") + reply);
-    EXPECT_EQ(Failure(list), std::string("916 ") + reply);
+    EXPECT_EQ(FailureOf(rename), std::string("916 ") + reply);
+    EXPECT_EQ(FailureOf(list), std::string("916 ") + reply);
   }
   for (const char* entry : {"5", "[]", "\"x\""}) {
     below_ = std::string(R"({"success":true,"data":[)") + entry + "]}";
-    EXPECT_EQ(Failure(rename).rfind("120 Not an object", 0), 0U) << entry;
-    EXPECT_EQ(Failure(list).rfind("913 Recv failed, res=", 0), 0U) << entry;
+    EXPECT_EQ(FailureOf(rename).rfind("120 Not an object", 0), 0U) << entry;
+    EXPECT_EQ(FailureOf(list).rfind("913 Recv failed, res=", 0), 0U) << entry;
   }
   below_ = R"({"success":true,"data":[{"KOVAMDFSName":"n"}]})";
-  EXPECT_EQ(Failure(rename).rfind("120 Missing property: KOVAMDParent", 0), 0U);
+  EXPECT_EQ(FailureOf(rename).rfind("120 Missing property: KOVAMDParent", 0), 0U);
   below_ = R"({"success":true,"data":[{"KOVAMDPath":"/o/b"},{},{"KOVAMDPath":"/o/a"},null]})";
-  EXPECT_EQ(Failure(list), "");
+  EXPECT_EQ(FailureOf(list), "");
   EXPECT_EQ(paths, (std::vector<std::string>{"kept", "/o/b", "/o/a"}));
 }
 
 TEST_F(ElasticControlTest, CommitTellsAFullVolumeFromOtherFailures) {
   platform_.engine = [](const std::string&) { return R"({"success":false,"error":{"code":1407,"msg":"disk"}})"; };
   const auto commit = [] { IndexCommit("photo"); };
-  EXPECT_EQ(Failure(commit), "1407 Request failed, msg=disk");
+  EXPECT_EQ(FailureOf(commit), "1407 Request failed, msg=disk");
   EXPECT_EQ(StatusMgr().GetShareStatus("photo"), 0);
   platform_.failing["KOVAQuotaIsEnough"] = {KOVA_ERR_OUT_OF_SPACE};
-  EXPECT_EQ(Failure(commit), "1003 Share (photo) space not enough");
+  EXPECT_EQ(FailureOf(commit), "1003 Share (photo) space not enough");
   EXPECT_TRUE(log_.Contains("(IndexCommit) Failed [!share.IsSpaceEnough()], reason: Share (photo) space not enough"));
   EXPECT_EQ(StatusMgr().GetShareStatus("photo"), StatusMgr::kNeedReindex);
 }

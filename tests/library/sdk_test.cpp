@@ -1,42 +1,19 @@
 #include <unistd.h>
 
-#include <functional>
-
-#include <gtest/gtest.h>
-
-#include <kova/error.h>
-#include <kova/fs.h>
-
-#include "common/error.h"
 #include "common/sdk_mutex.h"
 #include "sdk/credentials.h"
 #include "sdk/share.h"
-#include "tests/support/fake_platform.h"
-#include "tests/support/log_capture.h"
-#include "tests/support/temp_dir.h"
+#include "tests/support/library_test.h"
 
 namespace ferrox::sdk {
 
 namespace {
 
-using test::FakePlatform;
+using test::FailureOf;
 
-/// "<code> <reason>" of what the call throws, "" when it does not.
-std::string Failure(const std::function<void()>& call) {
-  try {
-    call();
-    return {};
-  } catch (const Error& error) {
-    return std::to_string(error.Code()) + " " + error.what();
-  }
-}
-
-class SDKTest : public testing::Test {
+class SDKTest : public test::LibraryTest {
  protected:
-  void SetUp() override {
-    platform_.Reset();
-    platform_.shares["photo"] = {"/volume1/photo", 1};
-  }
+  void SetUp() override { platform_.shares["photo"] = {"/volume1/photo", 1}; }
   // Nothing may leave the mutex taken, on no way.
   void TearDown() override {
     ASSERT_TRUE(SDKMutex().TryLock());
@@ -48,9 +25,6 @@ class SDKTest : public testing::Test {
     platform_.users["alice"] = {1000, 100, false, "", 0};
     platform_.users["boss"] = {1001, 100, true, "", 0};
   }
-
-  FakePlatform& platform_ = FakePlatform::Get();
-  test::LogCapture log_;
 };
 
 using SDKShareTest = SDKTest;
@@ -95,7 +69,7 @@ TEST_F(SDKShareTest, OnlyExactlyOneIsYes) {
 }
 
 TEST_F(SDKShareTest, FailuresNameTheCallAndTheShare) {
-  EXPECT_EQ(Failure([] { SDKShare missing("nope"); }), "800 nope");
+  EXPECT_EQ(FailureOf([] { SDKShare missing("nope"); }), "800 nope");
   const SDKShare share("photo");
   struct Row {
     const char* call;
@@ -118,7 +92,7 @@ TEST_F(SDKShareTest, FailuresNameTheCallAndTheShare) {
            Row{"KLIBShareEnum", [] { SDKShare::Enum(); }, "121 KLIBShareEnum failed"},
        }) {
     platform_.failing = {{row.call, {}}};
-    EXPECT_EQ(Failure(row.use), row.failure);
+    EXPECT_EQ(FailureOf(row.use), row.failure);
     EXPECT_EQ(log_.Lines().back().rfind("share:", 0), 0U) << log_.Lines().back();
   }
 }
@@ -156,16 +130,16 @@ TEST_F(SDKCredentialsTest, GivesTheIdentityBack) {
 TEST_F(SDKCredentialsTest, FailuresAreThrownAlsoAtTheEnd) {
   BecomeRoot();
   platform_.failing["KOVAUserGetByUID"] = {0x1D00, 0, 1};
-  EXPECT_EQ(Failure([] { SDKCredentials credentials; }), "503 KOVAUserGetByUID failed, err=7424");
-  EXPECT_EQ(Failure([] { SDKCredentials credentials("stranger"); }), "503 ");
+  EXPECT_EQ(FailureOf([] { SDKCredentials credentials; }), "503 KOVAUserGetByUID failed, err=7424");
+  EXPECT_EQ(FailureOf([] { SDKCredentials credentials("stranger"); }), "503 ");
   EXPECT_TRUE(log_.Contains("Failed [!ResetCredentialsByName(target_username)]"));
   platform_.failing["ResetCredentialsByName"] = {KOVA_ERR_SYSTEM, 1, 1};
-  EXPECT_EQ(Failure([] { SDKCredentials credentials("alice"); }), "503 ");
+  EXPECT_EQ(FailureOf([] { SDKCredentials credentials("alice"); }), "503 ");
   EXPECT_TRUE(log_.Contains("(~SDKCredentials) Failed [!ResetCredentialsByName(username_)]"));
   // While another failure is on its way the second one is only logged.
   platform_.euid = 0;
   platform_.failing["ResetCredentialsByName"] = {KOVA_ERR_SYSTEM, 1, 1};
-  EXPECT_EQ(Failure([] {
+  EXPECT_EQ(FailureOf([] {
               const SDKCredentials credentials("alice");
               throw Error(Error::kInternal, "first");
             }),

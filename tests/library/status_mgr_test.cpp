@@ -1,44 +1,23 @@
 #include "fileindex/status_mgr.h"
 
-#include <sys/stat.h>
 #include <unistd.h>
 
 #include <cerrno>
-#include <filesystem>
-#include <functional>
 
-#include <gtest/gtest.h>
-
-#include "common/error.h"
 #include "common/lock_file.h"
-#include "common/paths.h"
-#include "tests/support/fake_clock.h"
-#include "tests/support/fake_platform.h"
-#include "tests/support/log_capture.h"
-#include "tests/support/temp_dir.h"
+#include "tests/support/library_test.h"
 #include "tests/support/unix_server.h"
 
 namespace ferrox::fileindex {
 
 namespace {
 
-using test::FakePlatform;
+namespace fs = std::filesystem;
+using test::FailureOf;
 
-int CodeOf(const std::function<void()>& call) {
-  try {
-    call();
-    return 0;
-  } catch (const Error& error) {
-    return error.Code();
-  }
-}
-
-class StatusMgrTest : public testing::Test {
+class StatusMgrTest : public test::LibraryTest {
  protected:
-  void SetUp() override {
-    FakePlatform::Get().Reset();
-    (void)std::filesystem::remove_all(path_);
-  }
+  void SetUp() override { (void)fs::remove_all(path_); }
   void Write(const std::string& text) { test::WriteFile(path_, text); }
   std::string Content() { return test::ReadFile(path_); }
   /// What the daemon is sent by `change`.
@@ -57,8 +36,6 @@ class StatusMgrTest : public testing::Test {
   }
 
   const std::string path_ = InstancePath(kFileIndexStatusCfgPath);
-  test::FakeClock clock_;
-  test::LogCapture log_;
 };
 
 }  // namespace
@@ -74,31 +51,27 @@ TEST_F(StatusMgrTest, BitsOfShares) {
   StatusMgr().UnsetShareStatus("music", 3);
   StatusMgr().ClearShareStatus("my \"share\"/\xff");
   EXPECT_EQ(Content(), "{\"share\":{\"music\":0,\"photo\":2}}\n");
-  (void)std::filesystem::remove(path_);
+  (void)fs::remove(path_);
   StatusMgr().ClearShareStatus("unknown");
   EXPECT_EQ(Content(), "{\"share\":null}\n") << "written all the same";
   EXPECT_EQ(StatusMgr().GetShareStatus("unknown"), 0);
 }
 
 TEST_F(StatusMgrTest, SavesAsRootForEverybodyToRead) {
-  FakePlatform& platform = FakePlatform::Get();
-  platform.users["web"] = {33, 33, false, "", 0};
-  platform.euid = 33;
-  platform.egid = 33;
+  platform_.users["web"] = {33, 33, false, "", 0};
+  platform_.euid = platform_.egid = 33;
   Write("{}");
-  ASSERT_EQ(chmod(path_.c_str(), 0600), 0);
+  fs::permissions(path_, fs::perms(0600));
   StatusMgr().SetShareStatus("photo", 1);
-  EXPECT_EQ(platform.switches, (std::vector<std::string>{"root", "web"}));
-  struct stat status = {};
-  ASSERT_EQ(stat(path_.c_str(), &status), 0);
-  EXPECT_EQ(status.st_mode & 0777, 0644U);
+  EXPECT_EQ(platform_.switches, (std::vector<std::string>{"root", "web"}));
+  EXPECT_EQ(fs::status(path_).permissions(), fs::perms(0644));
 }
 
 TEST_F(StatusMgrTest, UnusableFilesCannotBeLoaded) {
   for (const char* bad : {"", "{", "{} x", "[]", "7", R"({"share":[]})", R"({"share":1})"}) {
     Write(bad);
     errno = 0;
-    EXPECT_EQ(CodeOf([] { StatusMgr(); }), Error::kLoadFailed) << bad;
+    EXPECT_EQ(FailureOf([] { StatusMgr(); }), "504 Cannot load json: " + path_) << bad;
     EXPECT_NE(log_.Lines().back().find("(StatusMgr) Failed [IsFileExist(kFileIndexStatusCfgPath) && "
                                        "!data_.fromFile(kFileIndexStatusCfgPath)], reason: Cannot load json: " +
                                        path_),
@@ -129,22 +102,22 @@ TEST_F(StatusMgrTest, PauseAndResumeAreStoredAndTold) {
 }
 
 TEST_F(StatusMgrTest, WhatFailsWhen) {
-  EXPECT_EQ(CodeOf([] { StatusMgr().Pause(-1); }), Error::kBadArgument);
-  EXPECT_TRUE(log_.Contains("Pause length should NOT be negative"));
-  EXPECT_FALSE(std::filesystem::exists(path_));
-  EXPECT_EQ(CodeOf([] { StatusMgr().Pause(1); }), Error::kInternal);
+  const auto set = [] { StatusMgr().SetShareStatus("photo", 1); };
+  EXPECT_EQ(FailureOf([] { StatusMgr().Pause(-1); }), "120 Pause length should NOT be negative");
+  EXPECT_FALSE(fs::exists(path_));
+  EXPECT_EQ(FailureOf([] { StatusMgr().Pause(1); }).substr(0, 3), "502");
   EXPECT_EQ(StatusMgr().GetPauseInfo(), 1700003600) << "recorded, although nobody could be told";
   {
     const LockFile held(InstancePath(kStatusLockPath), true);
-    EXPECT_EQ(CodeOf([] { StatusMgr().SetShareStatus("photo", 1); }), Error::kLockFailed);
+    EXPECT_EQ(FailureOf(set).substr(0, 3), "506");
   }
-  std::filesystem::create_directories(path_ + ".new");  // no file can be written beside
-  EXPECT_EQ(CodeOf([] { StatusMgr().SetShareStatus("photo", 1); }), Error::kSaveFailed);
+  fs::create_directories(path_ + ".new");  // no file can be written beside
+  EXPECT_EQ(FailureOf(set), "505 Failed to save json: " + path_);
   EXPECT_TRUE(log_.Contains("[!data_.toFile(kFileIndexStatusCfgPath)], reason: Failed to save json: " + path_));
-  (void)std::filesystem::remove(path_ + ".new");
+  (void)fs::remove(path_ + ".new");
   EXPECT_EQ(StatusMgr().GetPauseInfo(), 1700003600) << "the old file stays";
-  FakePlatform::Get().failing["ResetCredentialsByName"] = {};
-  EXPECT_EQ(CodeOf([] { StatusMgr().SetShareStatus("photo", 1); }), Error::kCredentialsFailed);
+  platform_.failing["ResetCredentialsByName"] = {};
+  EXPECT_EQ(FailureOf(set), "503 ");
 }
 
 }  // namespace ferrox::fileindex

@@ -1,37 +1,21 @@
 #include "fileindex/util.h"
 
 #include <algorithm>
-#include <filesystem>
-#include <functional>
 #include <sstream>
-
-#include <gtest/gtest.h>
 
 #include <kova/fs.h>
 
-#include "common/error.h"
 #include "fileindex/file_types.h"
-#include "tests/support/fake_platform.h"
-#include "tests/support/log_capture.h"
-#include "tests/support/temp_dir.h"
+#include "tests/support/library_test.h"
 
 namespace ferrox::fileindex {
 
 namespace {
 
 namespace fs = std::filesystem;
-using test::FakePlatform;
+using test::FailureOf;
 
-std::string Failure(const std::function<void()>& call) {
-  try {
-    call();
-    return {};
-  } catch (const Error& error) {
-    return std::to_string(error.Code()) + " " + error.what();
-  }
-}
-
-class UtilTest : public testing::Test {
+class UtilTest : public test::LibraryTest {
  protected:
   void SetUp() override {
     platform_.Reset();
@@ -40,11 +24,9 @@ class UtilTest : public testing::Test {
     platform_.shares["photo"] = {share_};
   }
 
-  FakePlatform& platform_ = FakePlatform::Get();
   test::TempDir dir_;
   const std::string volume_ = fs::canonical(dir_.Path()).string();
   const std::string share_ = volume_ + "/photo";
-  test::LogCapture log_;
 };
 
 size_t CountOf(FileType type) {
@@ -61,15 +43,15 @@ TEST_F(UtilTest, SharePathsAndFullPaths) {
     EXPECT_EQ(GetShareNameByPath(path), name) << path;
   }
   for (const char* bad : {"", "photo/a"}) {
-    EXPECT_EQ(Failure([&] { GetShareNameByPath(bad); }), "120 ") << bad;
+    EXPECT_EQ(FailureOf([&] { GetShareNameByPath(bad); }), "120 ") << bad;
   }
   EXPECT_TRUE(log_.Contains("Failed [1 > share_path.size() || '/' != share_path.at(0)]"));
   EXPECT_EQ(GetFullPath("/photo/folder/b"), share_ + "/folder/b");
-  EXPECT_EQ(Failure([] { GetFullPath("/nope/b"); }), "800 nope");
+  EXPECT_EQ(FailureOf([] { GetFullPath("/nope/b"); }), "800 nope");
   std::string name, path;
   GetShareNamePathByFullPath(name, path, share_ + "/folder");
   EXPECT_EQ(name + " " + path, "photo /photo/folder");
-  EXPECT_EQ(Failure([&] { GetShareNamePathByFullPath(name, path, volume_); }),
+  EXPECT_EQ(FailureOf([&] { GetShareNamePathByFullPath(name, path, volume_); }),
             "502 KOVAShareNamePathGet failed, full_path=" + volume_);
   std::string same = "/photo/x";
   GetFullPath(same, same);
@@ -85,7 +67,7 @@ TEST_F(UtilTest, ReplacePathShareTouchesOneComponent) {
     EXPECT_EQ(ReplacePathShare(path, "new", "old"), expected) << path;
   }
   for (const char* bad : {"/volume1/older/x", "old/x", "", "/Old/x"}) {
-    EXPECT_EQ(Failure([&] { ReplacePathShare(bad, "new", "old"); }), "120 Cannot find share: old") << bad;
+    EXPECT_EQ(FailureOf([&] { ReplacePathShare(bad, "new", "old"); }), "120 Cannot find share: old") << bad;
   }
   EXPECT_TRUE(log_.Contains("Failed [string::npos == pos]"));
 }
@@ -140,7 +122,6 @@ TEST_F(UtilTest, WhatCanBeIndexed) {
        {"/photo/missing", "/photo/folder/", "/photo//folder", "/photo/folder/../a.jpg", "/photo/link"}) {
     EXPECT_FALSE(CanPathBeIndexed(path)) << path;
   }
-  test::FakeShare& share = platform_.shares["photo"];
   struct Row {
     const char* what;
     std::function<void()> make;
@@ -155,18 +136,19 @@ TEST_F(UtilTest, WhatCanBeIndexed) {
            Row{"image", [&] { platform_.fs_types[share_] = KOVA_FS_SQUASHFS; }},
            Row{"type 12", [&] { platform_.fs_types[share_] = 12; }},
            Row{"no type", [&] { platform_.failing["KOVAGetFSType"] = {}; }},
-           Row{"read-only share", [&] { share.read_only = 1; }},
-           Row{"locked share", [&] { share.encrypted = 1; }},
+           Row{"read-only share", [&] { platform_.shares["photo"].read_only = 1; }},
+           Row{"locked share", [&] { platform_.shares["photo"].encrypted = 1; }},
            Row{"recycle bin", [&] { platform_.recycle_bins = {path}; }},
            Row{"mount point", [&] { platform_.mount_points = {path}; }},
-           Row{"mount of an encrypted share", [&] { platform_.mount_points = {path}, share.encryption = 1; }, true},
+           Row{"mount of an encrypted share",
+               [&] { platform_.mount_points = {path}, platform_.shares["photo"].encryption = 1; }, true},
        }) {
     SetUp();
     row.make();
     EXPECT_EQ(CanFullPathBeIndexed(path), row.expected) << row.what;
   }
   SetUp();
-  EXPECT_EQ(Failure([&] { CanFullPathBeIndexed(volume_); }), "502 KOVAShareNamePathGet failed, full_path=" + volume_);
+  EXPECT_EQ(FailureOf([&] { CanFullPathBeIndexed(volume_); }), "502 KOVAShareNamePathGet failed, full_path=" + volume_);
 }
 
 TEST_F(UtilTest, RecycleBins) {
