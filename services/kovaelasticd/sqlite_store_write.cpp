@@ -199,7 +199,8 @@ void SqliteStore::Get(const GetRequest& request, const std::function<void(const 
     return;
   }
   Statement statement = writer_.Prepare(sql);
-  PrefixRange(request.prefix).Bind(statement);
+  const PrefixRange range(request.prefix);  // the statement refers to its texts
+  range.Bind(statement);
   statement.Bind(3, std::string_view(request.after)).Bind(4, request.limit);
   while (statement.Step()) take(LoadEntry(ReadRow(statement), request.fields));
 }

@@ -46,7 +46,8 @@ std::vector<std::string> Searcher::SuggestWord(const std::string& word) {
   std::vector<Candidate> candidates;
   Statement statement =
       reader_.database.Prepare("SELECT word, documents FROM suggestions WHERE word >= ?1 AND word < ?2");
-  PrefixRange(word.substr(0, 1)).Bind(statement);
+  const PrefixRange range(word.substr(0, 1));  // the statement refers to its texts
+  range.Bind(statement);
   while (statement.Step()) {
     const size_t distance = EditDistance(word, statement.Text(0), limit);
     if (distance == 0 || distance > limit) continue;
