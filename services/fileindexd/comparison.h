@@ -1,0 +1,30 @@
+#pragma once
+
+#include <sys/stat.h>
+
+#include <functional>
+#include <string>
+
+#include "services/fileindexd/share_index.h"
+#include "services/fileindexd/tree_walk.h"
+
+namespace ferrox::indexd {
+
+/// What a comparison found. Called in the order of the paths, by the calling thread.
+struct ComparisonActions {
+  /// Whether the document of this stamp still tells the truth about the file.
+  std::function<bool(const IndexedEntry& indexed, const struct stat& status)> is_current;
+  /// The file is new or changed.
+  std::function<void(const std::string& path, const struct stat& status)> write;
+  /// The document's file is gone or no longer indexed.
+  std::function<void(const std::string& path)> remove;
+  /// Each file walked by, before the others.
+  std::function<void()> examined = [] {};
+};
+
+/// Compares what lies below `folder` on disk, as `walk` returns it, with the documents that the index has there.
+/// Documents of what the system could not read are left alone. Holds one page of documents in memory.
+/// @throws what the index and the actions do.
+void CompareBelow(const std::string& folder, TreeWalk& walk, ShareIndex& index, const ComparisonActions& actions);
+
+}  // namespace ferrox::indexd

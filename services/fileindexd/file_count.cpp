@@ -1,0 +1,68 @@
+#include "services/fileindexd/file_count.h"
+
+#include <dirent.h>
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <memory>
+#include <utility>
+#include <vector>
+
+#include "services/fileindexd/path_rules.h"
+
+namespace ferrox::indexd {
+
+namespace {
+
+struct DirClose {
+  void operator()(DIR* dir) const { (void)closedir(dir); }
+};
+using DirPtr = std::unique_ptr<DIR, DirClose>;
+
+DirPtr OpenFolder(const std::string& path, dev_t& device) {
+  const int fd = open(path.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC);
+  struct stat status = {};
+  if (fd < 0 || fstat(fd, &status) != 0) {
+    if (fd >= 0) (void)close(fd);
+    return nullptr;
+  }
+  device = status.st_dev;
+  return DirPtr(fdopendir(fd));
+}
+
+}  // namespace
+
+FileCount::FileCount(const std::string& folder, ShareStatus& status)
+    : status_(status), thread_([this, folder] { Count(folder); }) {}
+
+FileCount::~FileCount() {
+  stop_.Request();
+  thread_.join();
+}
+
+void FileCount::Count(const std::string& folder) {
+  std::vector<std::string> waiting = {folder};
+  uint64_t files = 0;
+  dev_t root_device = 0;
+  for (bool first = true; !waiting.empty(); first = false) {
+    const std::string path = std::move(waiting.back());
+    waiting.pop_back();
+    dev_t device = 0;
+    const DirPtr dir = OpenFolder(path, device);
+    if (!dir) continue;
+    if (first) root_device = device;
+    if (device != root_device) continue;
+    while (const dirent* entry = readdir(dir.get())) {
+      const std::string name = entry->d_name;
+      if (name == "." || name == ".." || entry->d_type == DT_LNK || PathRules::SkipName(name)) continue;
+      ++files;
+      if (entry->d_type == DT_DIR) waiting.push_back(path + "/" + name);
+    }
+    if (stop_.Requested()) return;
+    status_.SetEstimate(files, false);
+  }
+  status_.SetEstimate(files, true);
+}
+
+}  // namespace ferrox::indexd

@@ -1,0 +1,28 @@
+#pragma once
+
+#include <string>
+#include <thread>
+
+#include "services/fileindexd/interruption.h"
+#include "services/fileindexd/share_status.h"
+
+namespace ferrox::indexd {
+
+/// Counts the files below a folder in a thread of its own while it lives, so that progress has an end to compare with.
+/// A quick count: it only reads names, and stays on the folder's device.
+class FileCount {
+ public:
+  FileCount(const std::string& folder, ShareStatus& status);
+  FileCount(const FileCount&) = delete;
+  FileCount& operator=(const FileCount&) = delete;
+  ~FileCount();
+
+ private:
+  void Count(const std::string& folder);
+
+  ShareStatus& status_;
+  Interruption stop_;
+  std::thread thread_;
+};
+
+}  // namespace ferrox::indexd

@@ -1,0 +1,57 @@
+#include <getopt.h>
+
+#include <cstdio>
+#include <cstdlib>
+#include <exception>
+
+#include "common/paths.h"
+#include "services/fileindexd/index_daemon.h"
+#include "services/support/daemon.h"
+
+namespace {
+
+constexpr char kUsage[] =
+    "Usage: fileindexd [--workers N]\n"
+    "Keeps the search index of each share in step with the share's queue of changes.\n"
+    "  --workers N   threads that read files (default: one a processor, at least 2)\n"
+    "  --help        this text\n"
+    "The environment variable FERROX_ROOT chooses the instance.\n";
+
+/// False when the arguments cannot be understood.
+bool ParseArguments(int argc, char** argv, ferrox::indexd::IndexDaemon::Options& options, bool& help) {
+  const option known[] = {{"workers", required_argument, nullptr, 'w'}, {"help", no_argument, nullptr, 'h'}, {}};
+  for (int letter = 0; (letter = getopt_long(argc, argv, "", known, nullptr)) != -1;) {
+    if (letter == '?') return false;
+    help = help || letter == 'h';
+    if (letter == 'w') options.workers = static_cast<unsigned>(strtoul(optarg, nullptr, 10));
+    if (letter == 'w' && (options.workers == 0 || options.workers > 256)) return false;
+  }
+  return optind == argc;
+}
+
+}  // namespace
+
+int main(int argc, char** argv) try {
+  ferrox::indexd::IndexDaemon::Options options;
+  bool help = false;
+  const bool understood = ParseArguments(argc, argv, options, help);
+  if (!understood || help) {
+    (void)fputs(kUsage, understood ? stdout : stderr);
+    return understood ? 0 : 2;
+  }
+  ferrox::services::Daemon daemon("fileindexd");
+  ferrox::indexd::IndexDaemon index_daemon(options);
+  ferrox::services::FrameServerOptions server_options;
+  server_options.socket_path = ferrox::InstancePath(ferrox::kFileIndexdSocket);
+  ferrox::services::FrameServer server(server_options,
+                                       [&index_daemon](const std::string& request, const ferrox::services::Peer& peer) {
+                                         return index_daemon.Handle(request, peer);
+                                       });
+  index_daemon.Start();
+  daemon.NotifyReady();
+  server.Run(daemon.StopFd());
+  return 0;
+} catch (const std::exception& error) {
+  (void)fprintf(stderr, "fileindexd: %s\n", error.what());
+  return 1;
+}

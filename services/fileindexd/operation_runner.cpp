@@ -1,0 +1,283 @@
+#include "services/fileindexd/operation_runner.h"
+
+#include <fcntl.h>
+#include <syslog.h>
+
+#include <cerrno>
+#include <cstring>
+#include <memory>
+
+#include <kova/content_extract.h>
+
+#include "common/error.h"
+#include "common/file_util.h"
+#include "common/log.h"
+#include "common/unique_fd.h"
+#include "services/fileindexd/comparison.h"
+#include "services/fileindexd/file_count.h"
+
+namespace ferrox::indexd {
+
+namespace {
+
+using fileindex::FileIndexOP;
+
+constexpr auto kCommitInterval = std::chrono::seconds(5);
+/// A comparison that has seen so many files tells how many there are.
+constexpr uint64_t kFilesBeforeCount = 500;
+
+enum class Presence { kThere, kGone, kUnknown };
+
+/// What is at `path` for the index: links count as nothing.
+Presence Look(const std::string& path, struct stat& status) {
+  if (lstat(path.c_str(), &status) == 0) return S_ISLNK(status.st_mode) ? Presence::kGone : Presence::kThere;
+  return errno == ENOENT || errno == ENOTDIR || errno == ELOOP ? Presence::kGone : Presence::kUnknown;
+}
+
+}  // namespace
+
+struct OperationRunner::Handler {
+  FileIndexOP op;
+  void (OperationRunner::*run)(const std::string& path, const std::string& old_path);
+};
+
+/// Until kinds can be switched off per folder, a changed configuration asks for nothing that a comparison does not do.
+constexpr OperationRunner::Handler OperationRunner::kHandlers[] = {
+    {fileindex::OP_DELETE, &OperationRunner::OnDelete},
+    {fileindex::OP_UPSERT, &OperationRunner::OnUpsert},
+    {fileindex::OP_ATTR, &OperationRunner::OnAttr},
+    {fileindex::OP_UPDATE_CFG, &OperationRunner::OnReindex},
+    {fileindex::OP_RENAME, &OperationRunner::OnRename},
+    {fileindex::OP_REINDEX, &OperationRunner::OnReindex},
+    {fileindex::OP_FULL_REINDEX, &OperationRunner::OnFullReindex},
+};
+
+OperationRunner::OperationRunner(const PassContext& context)
+    : context_(context), rules_(context.share, context.root), tasks_(context.pool, context.interruption) {}
+
+void OperationRunner::Run(const fileindex::OP& op) {
+  context_.interruption.Check();
+  const std::string path = op.node->GetPath();
+  const bool ours = path == context_.root || StringStartWith(path, context_.root + "/");
+  if (!ours && op.op != fileindex::OP_FULL_REINDEX) {
+    Log(LOG_WARNING, "queue of share %s: %s lies outside of it, skipped", context_.share.c_str(), path.c_str());
+  } else {
+    for (const Handler& handler : kHandlers) {
+      if (handler.op == op.op) (this->*handler.run)(path, op.path);
+    }
+  }
+  context_.status.OperationDone();
+  CommitIfDue();
+}
+
+void OperationRunner::Finish() {
+  tasks_.Wait();
+  Commit();
+}
+
+void OperationRunner::KeepWhatIsDone() noexcept {
+  try {
+    if (uncommitted_) Commit();
+  } catch (const std::exception&) {
+    // What is not committed is done again when the queue is taken up again.
+  }
+}
+
+void OperationRunner::Enter(Phase phase) {
+  if (phase_ != phase) tasks_.Wait();
+  phase_ = phase;
+}
+
+/// What has been written becomes searchable and safe while a long pass goes on.
+void OperationRunner::CommitIfDue() {
+  if (!uncommitted_ || std::chrono::steady_clock::now() - last_commit_ < kCommitInterval) return;
+  Commit();
+}
+
+void OperationRunner::Commit() {
+  uncommitted_ = false;
+  context_.index.Commit();
+  context_.status.Committed();
+  last_commit_ = std::chrono::steady_clock::now();
+}
+
+void OperationRunner::OnDelete(const std::string& path, const std::string&) {
+  Enter(Phase::kDeletes);
+  if (path == context_.root) return;
+  tasks_.Submit([this, path] { RemoveTree(path); });
+}
+
+void OperationRunner::OnUpsert(const std::string& path, const std::string&) {
+  Enter(Phase::kWrites);
+  if (path == context_.root) return;
+  const bool wanted = rules_.CanBeIndexed(path);
+  tasks_.Submit([this, path, wanted] { wanted ? Write(path) : Remove(path); });
+}
+
+void OperationRunner::OnAttr(const std::string& path, const std::string&) {
+  Enter(Phase::kWrites);
+  if (path == context_.root) return;
+  if (!rules_.CanBeIndexed(path)) {
+    tasks_.Submit([this, path] { Remove(path); });
+  } else if (BecameReadable(path)) {
+    Compare(path);
+  } else {
+    tasks_.Submit([this, path] { RefreshAttributes(path); });
+  }
+}
+
+/// The documents move; what the rename brings into the index, or takes out of it, is compared or removed instead.
+void OperationRunner::OnRename(const std::string& path, const std::string& old_path) {
+  tasks_.Wait();
+  const bool wanted = path != context_.root && rules_.CanBeIndexed(path);
+  const bool was_wanted = old_path != context_.root && rules_.CanBeIndexed(old_path);
+  const bool moves = wanted && was_wanted && !context_.replay && MoveDocuments(path, old_path);
+  if (moves) return RefreshRenamed(path, old_path);
+  if (was_wanted) Compare(old_path);
+  Compare(path);
+}
+
+/// False when there is no document at the old path.
+bool OperationRunner::MoveDocuments(const std::string& path, const std::string& old_path) {
+  uncommitted_ = true;
+  try {
+    context_.index.Rename(path, old_path);
+    return true;
+  } catch (const Error& error) {
+    if (error.Code() != Error::kEngineNoSuchDocument) throw;
+    return false;
+  }
+}
+
+/// A rename changes the moved entry itself, and with another extension the way in which its content is read. When it
+/// is gone already, a later operation knows its present place and still needs the document.
+void OperationRunner::RefreshRenamed(const std::string& path, const std::string& old_path) {
+  struct stat status = {};
+  if (Look(path, status) != Presence::kThere) return;
+  const bool same_kind = GetFileExtension(path, true) == GetFileExtension(old_path, true);
+  tasks_.Submit([this, path, same_kind] { same_kind ? RefreshAttributes(path) : Write(path); });
+}
+
+void OperationRunner::OnReindex(const std::string& path, const std::string&) { Compare(path); }
+
+void OperationRunner::OnFullReindex(const std::string&, const std::string&) { Compare(context_.root); }
+
+void OperationRunner::Write(const std::string& path) {
+  struct stat status = {};
+  if (Look(path, status) == Presence::kGone) return Remove(path);
+  try {
+    uncommitted_ = true;
+    context_.index.Upsert(path, S_ISREG(status.st_mode));
+    context_.status.DocumentsWritten(1);
+  } catch (const Error& error) {
+    RecordFailure(error, path);
+  }
+}
+
+void OperationRunner::RefreshAttributes(const std::string& path) {
+  struct stat status = {};
+  if (Look(path, status) == Presence::kGone) return Remove(path);
+  try {
+    uncommitted_ = true;
+    context_.index.Attr(path);
+    context_.status.DocumentsWritten(1);
+  } catch (const Error& error) {
+    if (error.Code() == Error::kEngineNoSuchDocument) return Write(path);
+    RecordFailure(error, path);
+  }
+}
+
+/// Called while an error is handled: goes on when it is the file's, passes it on when it is the engine's.
+void OperationRunner::RecordFailure(const Error& error, const std::string& path) {
+  struct stat status = {};
+  if (error.Code() == Error::kParseFailed) {
+    if (Look(path, status) == Presence::kGone) return Remove(path);
+    return context_.status.AddFailure("cannot be examined", path);
+  }
+  if (error.Code() != Error::kEngineBadRequest) throw;
+  context_.status.AddFailure(error.what(), path);
+}
+
+void OperationRunner::Remove(const std::string& path) {
+  uncommitted_ = true;
+  context_.index.Delete(path);
+  context_.status.DocumentsDeleted(1);
+}
+
+void OperationRunner::RemoveTree(const std::string& path) {
+  Remove(path);
+  context_.index.DeleteBelow(path);
+}
+
+/// Whether a folder can be read of which the index knows no content: its permissions may just have been opened.
+bool OperationRunner::BecameReadable(const std::string& folder) {
+  const UniqueFd opened(open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
+  return opened.Valid() && context_.index.List(folder, "", 1).empty();
+}
+
+void OperationRunner::Compare(const std::string& path) {
+  tasks_.Wait();
+  phase_ = Phase::kWrites;
+  if (path != context_.root) {
+    if (!StringStartWith(path, context_.root + "/")) return;
+    struct stat status = {};
+    const Presence presence = Look(path, status);
+    if (presence == Presence::kUnknown) {
+      return context_.status.AddFailure(std::string("cannot be examined: ") + strerror(errno), path);
+    }
+    if (presence == Presence::kGone || !rules_.CanBeIndexed(path)) return RemoveTree(path);
+    CompareOne(path, status);
+    if (!S_ISDIR(status.st_mode)) return context_.index.DeleteBelow(path);
+  }
+  CompareFolder(path);
+}
+
+void OperationRunner::CompareOne(const std::string& path, const struct stat& status) {
+  const auto indexed = context_.index.Find(path);
+  if (!indexed.empty() && IsCurrent(indexed.front(), status)) return;
+  tasks_.Submit([this, path] { Write(path); });
+}
+
+void OperationRunner::CompareFolder(const std::string& folder) {
+  WalkRules walk_rules;
+  walk_rules.skip_name = &PathRules::SkipName;
+  walk_rules.may_enter = [this](const std::string& path, const struct stat& status, dev_t device) {
+    return rules_.MayEnter(path, status, device);
+  };
+  walk_rules.on_problem = [this](const std::string& path, int error) {
+    context_.status.AddFailure(std::string("cannot be read: ") + strerror(error), path);
+  };
+  TreeWalk walk(folder, walk_rules);
+  FERROX_FAIL_IF(!walk.Opened() && folder == context_.root, Error::kInternal, "the share's folder cannot be read");
+
+  context_.status.BeginComparison(folder);
+  CompareBelow(folder, walk, context_.index, Actions(folder));
+  tasks_.Wait();
+  context_.status.LinksSkipped(walk.LinksSkipped());
+  context_.status.EndComparison();
+}
+
+ComparisonActions OperationRunner::Actions(const std::string& folder) {
+  ComparisonActions actions;
+  actions.is_current = [this](const IndexedEntry& entry, const struct stat& status) {
+    return IsCurrent(entry, status);
+  };
+  actions.write = [this](const std::string& path, const struct stat&) { tasks_.Submit([this, path] { Write(path); }); };
+  actions.remove = [this](const std::string& path) { tasks_.Submit([this, path] { Remove(path); }); };
+  const auto count = std::make_shared<std::unique_ptr<FileCount>>();
+  actions.examined = [this, folder, count, examined = uint64_t{0}]() mutable {
+    context_.interruption.Check();
+    context_.status.FileExamined();
+    if (++examined == kFilesBeforeCount) *count = std::make_unique<FileCount>(folder, context_.status);
+    CommitIfDue();
+  };
+  return actions;
+}
+
+bool OperationRunner::IsCurrent(const IndexedEntry& indexed, const struct stat& status) {
+  const bool current = indexed.stamp == KOVA::CONTENT_EXTRACT::Stamp(status);
+  if (current && !indexed.extract_error.empty()) context_.status.NoteUnreadContent(indexed.extract_error, indexed.path);
+  return current;
+}
+
+}  // namespace ferrox::indexd

@@ -1,0 +1,83 @@
+#include "services/fileindexd/path_rules.h"
+
+#include <cerrno>
+
+#include <kova/fs.h>
+
+#include "common/error.h"
+#include "common/file_util.h"
+#include "fileindex/util.h"
+#include "sdk/share.h"
+
+namespace ferrox::indexd {
+
+namespace {
+
+constexpr size_t kFoldersRemembered = 10000;
+
+bool InSnapshot(const std::string& path) {
+  int in_snapshot = 0;
+  return KLIBFhsPathInSnapshot(path.c_str(), &in_snapshot) == 0 && in_snapshot == 1;
+}
+
+/// Of a folder that is gone, only its place can be judged: it may be an old or a passing name of one that is indexed,
+/// and the operations that follow still need its documents.
+bool AskAllRules(const std::string& folder) {
+  struct stat status = {};
+  const bool gone = lstat(folder.c_str(), &status) != 0 && (errno == ENOENT || errno == ENOTDIR);
+  try {
+    if (gone) return !fileindex::IsFullPathInRecycleBin(folder);
+    return fileindex::CanFullPathBeIndexed(folder) && !InSnapshot(folder);
+  } catch (const Error&) {
+    return false;  // its share cannot be told any more
+  }
+}
+
+}  // namespace
+
+PathRules::PathRules(const std::string& share, const std::string& root) : share_(share), root_(root) {}
+
+std::string PathRules::ShareProblem() const {
+  struct stat status = {};
+  if (stat(root_.c_str(), &status) != 0 || !S_ISDIR(status.st_mode)) {
+    return "its folder " + root_ + " is not there; mount it, or remove the share";
+  }
+  const int type = KOVAGetFSType(root_.c_str(), 0);
+  if (type < 0 || type == KOVA_FS_PSEUDO) return root_ + " lies on a file system that holds no files of users";
+  if (KOVAFSIsRemoteFS(type) != 0) return root_ + " lies on another machine; index it there";
+  if (KOVAFSIsImageFS(type) != 0) return root_ + " is a mounted image, which is not indexed";
+  if (RealPath(root_) != root_) return root_ + " leads through a link; give the share its real folder";
+  if (!sdk::SDKShare(share_).CanBeIndexed()) return "the share is locked or read-only";
+  return "";
+}
+
+bool PathRules::SkipName(const std::string& name) { return fileindex::IsSystemPreservedFileName(name); }
+
+bool PathRules::CanBeIndexed(const std::string& path) {
+  if (path == root_) return true;
+  if (!StringStartWith(path, root_ + "/")) return false;
+  struct stat status = {};
+  const bool is_folder = lstat(path.c_str(), &status) == 0 && S_ISDIR(status.st_mode);
+  return is_folder ? FolderCanBeIndexed(path) : !SkipName(Basename(path)) && FolderCanBeIndexed(Dirname(path));
+}
+
+bool PathRules::FolderCanBeIndexed(const std::string& folder) {
+  if (folder == root_) return true;
+  const auto known = folders_.find(folder);
+  if (known != folders_.end()) return known->second;
+  const std::string parent = Dirname(folder);
+  const bool answer = FolderCanBeIndexed(parent) && !SkipName(Basename(folder)) && AskAllRules(folder);
+  if (folders_.size() >= kFoldersRemembered) folders_.clear();
+  folders_[folder] = answer;
+  return answer;
+}
+
+bool PathRules::MayEnter(const std::string& path, const struct stat& status, dev_t parent_device) const {
+  const std::string name = Basename(path);
+  const bool telling_name =
+      name.find("#snapshot") != std::string::npos || name.find("#recycle") != std::string::npos || share_ == "homes";
+  if (!telling_name && status.st_dev == parent_device && KOVAFSDirIsMntPoint(path.c_str()) == 0) return true;
+  return AskAllRules(path);
+}
+
+}  // namespace ferrox::indexd

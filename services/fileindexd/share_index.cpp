@@ -1,0 +1,121 @@
+#include "services/fileindexd/share_index.h"
+
+#include <syslog.h>
+
+#include "common/json_util.h"
+#include "common/log.h"
+#include "common/paths.h"
+#include "fileindex/elastic/comm.h"
+#include "fileindex/elastic/elastic_control.h"
+#include "services/support/local_request.h"
+
+namespace ferrox::indexd {
+
+namespace {
+
+namespace elastic = fileindex::elastic;
+
+constexpr std::chrono::seconds kFiguresWait(2);
+constexpr char kPathField[] = "KOVAMDPath";
+constexpr char kStampField[] = "_KOVAStamp";
+constexpr char kExtractErrorField[] = "_KOVAExtractError";
+
+IndexedEntry ToEntry(const Json::Value& fields) {
+  IndexedEntry entry;
+  GetJsonValue(entry.path, fields, kPathField, true);
+  GetJsonValue(entry.stamp, fields, kStampField, false);
+  GetJsonValue(entry.extract_error, fields, kExtractErrorField, false);
+  return entry;
+}
+
+class Engine : public ShareIndex {
+ public:
+  explicit Engine(const std::string& share) : share_(share), id_(elastic::GetFileIndexID(share)) {}
+
+  bool Exists() override {
+    Json::Value request = Request("index_stat");
+    Json::Value reply;
+    try {
+      elastic::SendRequest(reply, request);
+    } catch (const Error& error) {
+      if (error.Code() == Error::kEngineNoSuchIndex) return false;
+      throw;
+    }
+    return true;
+  }
+
+  void Create() override {
+    try {
+      return elastic::ShareIndexCreate(share_);
+    } catch (const Error& error) {
+      if (error.Code() != Error::kEngineIndexExists) throw;
+      Log(LOG_WARNING, "index %s belongs to another folder of that name; it is made anew", id_.c_str());
+    }
+    elastic::ShareIndexDelete(share_);
+    elastic::ShareIndexCreate(share_);
+  }
+
+  void Upsert(const std::string& path, bool need_meta) override { elastic::IndexUpsert(share_, path, need_meta); }
+  void Attr(const std::string& path) override { elastic::IndexAttr(share_, path); }
+  void Delete(const std::string& path) override { elastic::IndexDel(share_, path); }
+  void DeleteBelow(const std::string& folder) override { elastic::IndexDelDir(share_, folder); }
+  void Rename(const std::string& new_path, const std::string& old_path) override {
+    elastic::IndexRename(share_, new_path, old_path);
+  }
+  void Commit() override { elastic::IndexCommit(share_); }
+
+  std::vector<IndexedEntry> List(const std::string& folder, const std::string& after, unsigned limit) override {
+    Json::Value query;
+    query["qsl"]["prefix"][kPathField] = folder + "/";
+    query["limit"] = limit;
+    if (!after.empty()) query["after"] = after;
+    return Query(std::move(query));
+  }
+
+  std::vector<IndexedEntry> Find(const std::string& path) override {
+    Json::Value query;
+    query["qsl"]["term"][kPathField] = path;
+    query["limit"] = 1;
+    return Query(std::move(query));
+  }
+
+  Json::Value Figures() override {
+    std::string text;
+    Json::Value reply;
+    const auto result =
+        services::AskLocally(InstancePath(kElasticdSocket), toString(Request("index_stat")), kFiguresWait, text);
+    const bool answered = result == services::RequestResult::kAnswered && fromString(reply, text) && reply.isObject();
+    return answered ? reply["data"] : Json::Value();
+  }
+
+ private:
+  Json::Value Request(const char* command) const {
+    Json::Value request;
+    request["command"] = command;
+    request["data"]["id"] = id_;
+    return request;
+  }
+
+  std::vector<IndexedEntry> Query(Json::Value query) const {
+    for (const char* field : {kPathField, kStampField, kExtractErrorField}) query["load_field"].append(field);
+    Json::Value request = Request("document_get_by_query");
+    request["data"]["query"] = std::move(query);
+    Json::Value reply;
+    elastic::SendRequest(reply, request);
+    const Json::Value& data = reply["data"];
+    FERROX_FAIL_IF(!data.isArray(), Error::kBadEngineReply, toString(reply));
+    std::vector<IndexedEntry> entries;
+    entries.reserve(data.size());
+    for (const Json::Value& fields : data) entries.push_back(ToEntry(fields));
+    return entries;
+  }
+
+  std::string share_;
+  std::string id_;
+};
+
+}  // namespace
+
+std::unique_ptr<ShareIndex> EngineShareIndex(const std::string& share) { return std::make_unique<Engine>(share); }
+
+}  // namespace ferrox::indexd

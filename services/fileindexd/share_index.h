@@ -1,0 +1,45 @@
+#pragma once
+
+#include <memory>
+#include <string>
+#include <vector>
+
+#include <json/value.h>
+
+namespace ferrox::indexd {
+
+/// What the index knows of one document.
+struct IndexedEntry {
+  std::string path;
+  std::string stamp;
+  std::string extract_error;  ///< why its content could not be read, or ""
+};
+
+/// One share's index, as the daemon's work needs it; every call may throw what the engine's commands do. Several
+/// threads may call at once.
+class ShareIndex {
+ public:
+  virtual ~ShareIndex() = default;
+
+  /// Whether the index exists.
+  virtual bool Exists() = 0;
+  /// Makes it when it is missing; replaces one of the same name that lies elsewhere.
+  virtual void Create() = 0;
+  virtual void Upsert(const std::string& path, bool need_meta) = 0;
+  virtual void Attr(const std::string& path) = 0;
+  virtual void Delete(const std::string& path) = 0;
+  virtual void DeleteBelow(const std::string& folder) = 0;
+  virtual void Rename(const std::string& new_path, const std::string& old_path) = 0;
+  virtual void Commit() = 0;
+  /// At most `limit` documents below `folder`, in byte order of their paths, those after `after` when it is not "".
+  virtual std::vector<IndexedEntry> List(const std::string& folder, const std::string& after, unsigned limit) = 0;
+  /// The document at `path`; none or one.
+  virtual std::vector<IndexedEntry> Find(const std::string& path) = 0;
+  /// The engine's figures: "documents", "bytes_on_disk", "extract_errors" and others. Does not wait for the engine.
+  virtual Json::Value Figures() = 0;
+};
+
+/// The index of `share` in the search engine.
+std::unique_ptr<ShareIndex> EngineShareIndex(const std::string& share);
+
+}  // namespace ferrox::indexd

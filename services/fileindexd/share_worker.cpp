@@ -1,0 +1,278 @@
+#include "services/fileindexd/share_worker.h"
+
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <syslog.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <vector>
+
+#include "common/clock.h"
+#include "common/error.h"
+#include "common/file_util.h"
+#include "common/log.h"
+#include "common/unique_fd.h"
+#include "fileindex/optree.h"
+#include "fileindex/queue_mgr.h"
+#include "fileindex/status_mgr.h"
+#include "fileindex/util.h"
+#include "sdk/share.h"
+#include "services/fileindexd/operation_runner.h"
+
+namespace ferrox::indexd {
+
+namespace {
+
+using fileindex::StatusMgr;
+using std::chrono::milliseconds;
+using std::chrono::seconds;
+
+/// A queue that has just changed is left for so long, since changes seldom come alone.
+constexpr milliseconds kGatherTime(100);
+/// The queue is looked at again after so long, whether or not it was seen to change.
+constexpr seconds kSlowTimer(30);
+constexpr seconds kSlowTimerWithoutWatch(2);
+constexpr int kClearedByReindex = StatusMgr::kNeedReindex | StatusMgr::kSecondCondition;
+
+bool HasContent(const std::string& path) {
+  struct stat status = {};
+  return lstat(path.c_str(), &status) == 0 && S_ISREG(status.st_mode) && status.st_size > 0;
+}
+
+uint64_t CountOperations(const fileindex::OPTree& tree) {
+  if (tree.crashed) return 1;
+  return static_cast<uint64_t>(
+      std::count_if(tree.ops.begin(), tree.ops.end(), [](const auto& op) { return op->op != fileindex::OP_NONE; }));
+}
+
+/// The lines of a queue file; of a long one, as many as its beginning lets expect.
+uint64_t CountLines(const std::string& path) {
+  const UniqueFd file(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK));
+  struct stat status = {};
+  if (!file.Valid() || fstat(file.Get(), &status) != 0 || status.st_size == 0) return 0;
+  std::string begin(size_t{1} << 20, '\0');
+  const ssize_t size = read(file.Get(), begin.data(), begin.size());
+  if (size <= 0) return 0;
+  const auto lines = static_cast<double>(std::count(begin.begin(), begin.begin() + size, '\n'));
+  return static_cast<uint64_t>(lines * static_cast<double>(status.st_size) / static_cast<double>(size));
+}
+
+/// When the first of the queue files was made, which is when its oldest change happened; 0 without a queue.
+int64_t OldestChange(const std::vector<std::string>& queue_files) {
+  int64_t oldest = 0;
+  for (const std::string& path : queue_files) {
+    struct statx status = {};
+    if (statx(AT_FDCWD, path.c_str(), AT_SYMLINK_NOFOLLOW, STATX_BTIME | STATX_MTIME | STATX_SIZE, &status) != 0 ||
+        status.stx_size == 0) {
+      continue;
+    }
+    const int64_t made = (status.stx_mask & STATX_BTIME) != 0 ? status.stx_btime.tv_sec : status.stx_mtime.tv_sec;
+    oldest = oldest == 0 ? made : std::min(oldest, made);
+  }
+  return oldest;
+}
+
+bool IsOutOfSpace(const Error& error, const std::string& share) {
+  if (error.Code() == Error::kSpaceNotEnough) return true;
+  return error.Code() == Error::kEngineStorage && !sdk::SDKShare(share).IsSpaceEnough();
+}
+
+}  // namespace
+
+bool PauseState::Paused() const {
+  const int64_t resume_time = resume_time_;
+  return resume_time == 0 || (resume_time > 0 && Clock::Get().Now() < resume_time);
+}
+
+milliseconds PauseState::Left() const {
+  const int64_t resume_time = resume_time_;
+  if (resume_time == 0) return std::chrono::hours(1);
+  return seconds(std::clamp<int64_t>(resume_time - Clock::Get().Now(), 0, 3600));
+}
+
+ShareWorker::ShareWorker(const std::string& share, const Environment& environment)
+    : share_(share),
+      root_(sdk::SDKShare(share).GetPath()),
+      queue_path_(sdk::SDKShare(share).GetQueuePath()),
+      environment_(environment),
+      index_(environment.open_index(share)),
+      watch_(queue_path_) {}
+
+ShareWorker::~ShareWorker() {
+  stopping_ = true;
+  Wake();
+  if (thread_.joinable()) thread_.join();
+}
+
+void ShareWorker::Start() {
+  thread_ = std::thread([this] { Loop(); });
+}
+
+void ShareWorker::Wake() {
+  if (stopping_ || environment_.pause.Paused()) interruption_.Request();
+  watch_.Wake();
+}
+
+void ShareWorker::Loop() {
+  const InterruptionScope scope(interruption_);
+  while (!stopping_) {
+    if (environment_.pause.Paused()) {
+      status_.SetState(ShareStatus::State::kPaused);
+      watch_.WaitForWake(environment_.pause.Left());
+      continue;
+    }
+    interruption_.Clear();
+    if (stopping_ || environment_.pause.Paused()) continue;
+    const milliseconds wait = Round();
+    if (stopping_ || environment_.pause.Paused()) continue;
+    if (delay_.count() > 0) {
+      watch_.WaitForWake(wait);
+    } else {
+      watch_.Wait(wait);
+    }
+  }
+}
+
+milliseconds ShareWorker::Round() {
+  try {
+    RunOnce();
+    delay_ = milliseconds(0);
+    told_no_space_ = false;
+    status_.SetState(ShareStatus::State::kIdle);
+    return watch_.SeesChanges() ? kSlowTimer : kSlowTimerWithoutWatch;
+  } catch (const Interrupted&) {
+    status_.EndPass();
+    return milliseconds(0);
+  } catch (const Error& error) {
+    status_.EndPass();
+    return OnFailure(error);
+  } catch (const std::exception& error) {
+    status_.EndPass();
+    Log(LOG_ERR, "share %s: unexpected failure: %s", share_.c_str(), error.what());
+    status_.SetState(ShareStatus::State::kError, error.what());
+    return NextDelay(seconds(10), seconds(300));
+  }
+}
+
+milliseconds ShareWorker::OnFailure(const Error& error) {
+  index_exists_ = index_exists_ && error.Code() != Error::kEngineNoSuchIndex;
+  try {
+    if (IsOutOfSpace(error, share_)) return OnNoSpace(error);
+  } catch (const Error&) {
+    // The share is gone: said below, as the failure that it led to.
+  }
+  if (error.Code() == Error::kEngineUnreachable) {
+    status_.SetState(ShareStatus::State::kWaitingForEngine,
+                     "the search engine does not answer; start it with 'fileindexctl up'");
+    return NextDelay(seconds(1), seconds(30));
+  }
+  if (error.Code() == Error::kEngineIndexPaused) {
+    status_.SetState(ShareStatus::State::kPaused, "the share's index is paused");
+    return NextDelay(seconds(30), seconds(30));
+  }
+  status_.SetState(ShareStatus::State::kError, std::string(error.what()) + " (" + std::to_string(error.Code()) + ")");
+  return NextDelay(seconds(2), seconds(300));
+}
+
+/// The share is marked as needing a reindex, so that whatever the full disk swallowed is found again.
+milliseconds ShareWorker::OnNoSpace(const Error& error) {
+  status_.SetState(ShareStatus::State::kWaitingForSpace,
+                   "less than 100 MiB are free; indexing goes on by itself when there is more");
+  if (!told_no_space_) {
+    told_no_space_ = true;
+    Log(LOG_ERR, "share %s: no space for its index: %s", share_.c_str(), error.what());
+    fileindex::SendZEMNotify();
+    try {
+      StatusMgr().SetShareStatus(share_, StatusMgr::kNeedReindex);
+    } catch (const Error&) {
+      told_no_space_ = false;  // the disk may be too full even for that; the next round tries again
+    }
+  }
+  return NextDelay(seconds(10), seconds(300));
+}
+
+milliseconds ShareWorker::NextDelay(milliseconds first, milliseconds last) {
+  delay_ = std::clamp(2 * delay_, first, last);
+  return delay_;
+}
+
+void ShareWorker::RunOnce() {
+  CheckShare();
+  EnsureIndex();
+  const std::string detached = queue_path_ + ".tmp";
+  do {
+    QueueNeededReindex();
+    const bool replay = IsFileExist(detached);
+    if (!replay && !HasContent(queue_path_)) break;
+    if (!replay) interruption_.SleepFor(kGatherTime);
+    RunPass(replay);
+  } while (true);
+}
+
+void ShareWorker::CheckShare() {
+  const sdk::SDKShare share(share_);
+  FERROX_FAIL_IF(share.GetPath() != root_, Error::kNoSuchShare, "the share's folder is another one now");
+  FERROX_FAIL_IF(told_no_space_ && !share.IsSpaceEnough(), Error::kSpaceNotEnough, "still less than 100 MiB free");
+  const std::string problem = PathRules(share_, root_).ShareProblem();
+  FERROX_FAIL_IF(!problem.empty(), Error::kPathNotIndexable, problem);
+}
+
+/// A new index has nothing in it: the reindex that fills it is queued before the index exists, so that a crash in
+/// between leaves no empty index that looks finished.
+void ShareWorker::EnsureIndex() {
+  if (index_exists_) return;
+  if (!index_->Exists()) {
+    (void)QueueReindex();
+    index_->Create();
+  }
+  index_exists_ = true;
+}
+
+/// Turns the share's mark into a queued reindex.
+void ShareWorker::QueueNeededReindex() {
+  if ((StatusMgr().GetShareStatus(share_) & StatusMgr::kNeedReindex) == 0) return;
+  if (QueueReindex()) StatusMgr().UnsetShareStatus(share_, kClearedByReindex);
+}
+
+/// False when the queue holds a damaged line and takes no event: the share is then marked, and asked for again once
+/// that queue has been worked off.
+bool ShareWorker::QueueReindex() {
+  try {
+    fileindex::AddCustomEvent(fileindex::EVENT_REINDEX, root_, "", Json::Value());
+    return true;
+  } catch (const Error& error) {
+    if (error.Code() != Error::kMalformedEvent && error.Code() != Error::kBadArgument) throw;
+    return false;
+  }
+}
+
+void ShareWorker::RunPass(bool replay) {
+  fileindex::QueueMgr queue(queue_path_);
+  if (!queue.PrepareTmpQueue() && !IsFileExist(queue_path_ + ".tmp")) return;
+  status_.BeginPass(CountOperations(*queue.GetOPTreeTmp()));
+  OperationRunner runner({share_, root_, *index_, environment_.pool, interruption_, status_, replay});
+  try {
+    (void)queue.ProcessOP([&runner](std::shared_ptr<fileindex::OP> op) { runner.Run(*op); }, true);
+    runner.Finish();
+  } catch (const Interrupted&) {
+    runner.KeepWhatIsDone();
+    throw;
+  }
+  queue.DeleteTmp();
+  status_.EndPass();
+}
+
+Json::Value ShareWorker::Status() {
+  Json::Value json = status_.ToJson();
+  json["share"] = share_;
+  json["path"] = root_;
+  const uint64_t pending = json["operations"].asUInt64() - json["operations_done"].asUInt64();
+  json["queued"] = Json::UInt64(pending + CountLines(queue_path_));
+  const int64_t oldest = OldestChange({queue_path_ + ".tmp", queue_path_});
+  if (oldest > 0) json["oldest_change"] = Json::Int64(oldest);
+  json["index"] = index_->Figures();
+  return json;
+}
+
+}  // namespace ferrox::indexd

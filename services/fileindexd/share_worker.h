@@ -1,0 +1,91 @@
+#pragma once
+
+#include <atomic>
+#include <chrono>
+#include <cstdint>
+#include <functional>
+#include <memory>
+#include <string>
+#include <thread>
+
+#include <json/value.h>
+
+#include "common/error.h"
+#include "services/fileindexd/interruption.h"
+#include "services/fileindexd/queue_watch.h"
+#include "services/fileindexd/share_index.h"
+#include "services/fileindexd/share_status.h"
+#include "services/fileindexd/task_pool.h"
+
+namespace ferrox::indexd {
+
+/// The pause as all workers see it: seconds since the epoch at which it ends, 0 for a pause without end, -1 for none.
+class PauseState {
+ public:
+  void Set(int64_t resume_time) { resume_time_ = resume_time; }
+  int64_t ResumeTime() const { return resume_time_; }
+  bool Paused() const;
+  /// How long it still lasts, at most an hour.
+  std::chrono::milliseconds Left() const;
+
+ private:
+  std::atomic<int64_t> resume_time_{-1};
+};
+
+/// Keeps the index of one share in step with its queue, in a thread of its own.
+class ShareWorker {
+ public:
+  struct Environment {
+    TaskPool& pool;
+    const PauseState& pause;
+    /// The index of a share.
+    std::function<std::unique_ptr<ShareIndex>(const std::string& share)> open_index = &EngineShareIndex;
+  };
+
+  /// @throws Error kNoSuchShare; kInternal.
+  ShareWorker(const std::string& share, const Environment& environment);
+  ShareWorker(const ShareWorker&) = delete;
+  ShareWorker& operator=(const ShareWorker&) = delete;
+  /// Stops the work where it is; the queue stays as it is and is taken up again by the next worker.
+  ~ShareWorker();
+
+  /// Begins to work in a thread.
+  void Start();
+  /// Looks again at the pause, the queue and the share's settings at once.
+  void Wake();
+
+  /// Carries out what is queued now, if anything. @throws Interrupted; Error when it is to be tried again.
+  void RunOnce();
+
+  Json::Value Status();
+
+ private:
+  void Loop();
+  /// One round of the loop: works, and tells how long to wait for the next.
+  std::chrono::milliseconds Round();
+  std::chrono::milliseconds OnFailure(const Error& error);
+  std::chrono::milliseconds OnNoSpace(const Error& error);
+  std::chrono::milliseconds NextDelay(std::chrono::milliseconds first, std::chrono::milliseconds last);
+
+  void CheckShare();
+  void EnsureIndex();
+  void QueueNeededReindex();
+  bool QueueReindex();
+  void RunPass(bool replay);
+
+  std::string share_;
+  std::string root_;
+  std::string queue_path_;
+  Environment environment_;
+  std::unique_ptr<ShareIndex> index_;
+  bool index_exists_ = false;
+  std::chrono::milliseconds delay_{0};
+  bool told_no_space_ = false;
+  ShareStatus status_;
+  QueueWatch watch_;
+  Interruption interruption_;
+  std::atomic<bool> stopping_{false};
+  std::thread thread_;
+};
+
+}  // namespace ferrox::indexd

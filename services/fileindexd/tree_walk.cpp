@@ -1,0 +1,172 @@
+#include "services/fileindexd/tree_walk.h"
+
+#include <dirent.h>
+#include <fcntl.h>
+#include <limits.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <cstring>
+#include <set>
+#include <string_view>
+
+#include "common/unique_fd.h"
+
+namespace ferrox::indexd {
+
+/// A name of a folder, or what lies below it: `length` counts the "/" behind the name in the second case.
+struct TreeWalk::Item {
+  size_t offset;
+  uint16_t length;
+  bool below;
+};
+
+/// One folder on the way: its names one after the other, each with a "/" behind it, and their order.
+struct TreeWalk::Level {
+  UniqueFd folder;
+  dev_t device = 0;
+  std::string prefix;
+  std::string names;
+  std::vector<Item> items;
+  size_t next = 0;
+  std::set<std::string> not_entered;
+
+  std::string Name(const Item& item) const {
+    return names.substr(item.offset, item.length - static_cast<size_t>(item.below));
+  }
+};
+
+namespace {
+
+struct DirClose {
+  void operator()(DIR* dir) const { (void)closedir(dir); }
+};
+
+/// Whether what cannot be opened for this reason holds nothing for the index. Any other reason says nothing about it.
+bool MeansNothingThere(int error) {
+  for (const int known : {ENOENT, ENOTDIR, ELOOP, EACCES, EPERM}) {
+    if (error == known) return true;
+  }
+  return false;
+}
+
+bool IsFolder(int folder, const dirent& entry) {
+  if (entry.d_type != DT_UNKNOWN) return entry.d_type == DT_DIR;
+  struct stat status = {};
+  return fstatat(folder, entry.d_name, &status, AT_SYMLINK_NOFOLLOW) == 0 && S_ISDIR(status.st_mode);
+}
+
+}  // namespace
+
+TreeWalk::TreeWalk(const std::string& folder, const WalkRules& rules) : rules_(rules) {
+  Entry entry;
+  if (Descend(AT_FDCWD, folder, folder, entry)) first_ = std::make_unique<Entry>(entry);
+  opened_ = !levels_.empty();
+}
+
+TreeWalk::~TreeWalk() = default;
+
+bool TreeWalk::Next(Entry& entry) {
+  if (first_) {
+    entry = *first_;
+    first_.reset();
+    return true;
+  }
+  while (!levels_.empty()) {
+    Level& level = *levels_.back();
+    if (level.next == level.items.size()) {
+      levels_.pop_back();
+      continue;
+    }
+    const Item item = level.items[level.next++];
+    if (!item.below) {
+      if (Examine(level, item, entry)) return true;
+      continue;
+    }
+    const std::string name = level.Name(item);
+    if (level.not_entered.count(name) != 0) continue;
+    if (Descend(level.folder.Get(), name, level.prefix + name, entry)) return true;
+  }
+  return false;
+}
+
+bool TreeWalk::Descend(int parent_fd, const std::string& name, const std::string& path, Entry& entry) {
+  auto level = std::make_unique<Level>();
+  level->folder.Reset(openat(parent_fd, name.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
+  struct stat status = {};
+  int error = level->folder.Valid() && fstat(level->folder.Get(), &status) == 0 ? 0 : errno;
+  if (error == 0) {
+    level->device = status.st_dev;
+    level->prefix = path + "/";
+    errno = 0;
+    ReadNames(*level);
+    error = errno;
+  }
+  if (error == 0) {
+    levels_.push_back(std::move(level));
+    return false;
+  }
+  if (error != ENOENT) rules_.on_problem(path, error);
+  if (MeansNothingThere(error)) return false;
+  entry = {Entry::Kind::kUnknownBelow, path, {}};
+  return true;
+}
+
+/// Leaves errno at 0 when all names could be read.
+void TreeWalk::ReadNames(Level& level) {
+  const int copy = fcntl(level.folder.Get(), F_DUPFD_CLOEXEC, 0);
+  const std::unique_ptr<DIR, DirClose> dir(copy < 0 ? nullptr : fdopendir(copy));
+  if (!dir) return;
+  while (true) {
+    errno = 0;
+    const dirent* entry = readdir(dir.get());
+    if (entry == nullptr) break;
+    const std::string name = entry->d_name;
+    if (name == "." || name == ".." || rules_.skip_name(name)) continue;
+    if (entry->d_type == DT_LNK) {
+      ++links_skipped_;
+      continue;
+    }
+    if (level.prefix.size() + name.size() >= PATH_MAX) {
+      rules_.on_problem(level.prefix + name, ENAMETOOLONG);
+      continue;
+    }
+    const auto length = static_cast<uint16_t>(name.size());
+    level.items.push_back({level.names.size(), length, false});
+    if (IsFolder(level.folder.Get(), *entry)) {
+      level.items.push_back({level.names.size(), static_cast<uint16_t>(length + 1), true});
+    }
+    level.names += name + "/";
+  }
+  const int error = errno;
+  const std::string_view names = level.names;
+  std::sort(level.items.begin(), level.items.end(), [names](const Item& left, const Item& right) {
+    return names.substr(left.offset, left.length) < names.substr(right.offset, right.length);
+  });
+  errno = error;
+}
+
+bool TreeWalk::Examine(Level& level, const Item& item, Entry& entry) {
+  const std::string name = level.Name(item);
+  struct stat status = {};
+  if (fstatat(level.folder.Get(), name.c_str(), &status, AT_SYMLINK_NOFOLLOW) != 0) {
+    const int error = errno;
+    if (error != ENOENT) rules_.on_problem(level.prefix + name, error);
+    if (MeansNothingThere(error)) return false;
+    entry = {Entry::Kind::kUnknown, level.prefix + name, {}};
+    return true;
+  }
+  if (S_ISLNK(status.st_mode)) {
+    ++links_skipped_;
+    return false;
+  }
+  std::string path = level.prefix + name;
+  if (S_ISDIR(status.st_mode) && !rules_.may_enter(path, status, level.device)) {
+    level.not_entered.insert(name);
+    return false;
+  }
+  entry = {Entry::Kind::kFound, std::move(path), status};
+  return true;
+}
+
+}  // namespace ferrox::indexd

@@ -1,0 +1,69 @@
+#pragma once
+
+#include <sys/stat.h>
+
+#include <cstdint>
+#include <functional>
+#include <memory>
+#include <string>
+#include <vector>
+
+namespace ferrox::indexd {
+
+/// What a walk leaves out, and whom it tells.
+struct WalkRules {
+  /// Whether a name is never indexed, nor anything below it.
+  std::function<bool(const std::string& name)> skip_name = [](const std::string&) { return false; };
+  /// Whether a folder found below one on the device `parent_device` may be entered; asked once per folder.
+  std::function<bool(const std::string& path, const struct stat& status, dev_t parent_device)> may_enter =
+      [](const std::string&, const struct stat&, dev_t) { return true; };
+  /// What could not be read, and errno.
+  std::function<void(const std::string& path, int error)> on_problem = [](const std::string&, int) {};
+};
+
+/// Walks a folder in the byte order of full paths, the order in which the index lists its documents: the entries of a
+/// folder are sorted by name, and what lies in a subfolder sorts as if the subfolder's name ended in "/". Links are not
+/// followed and not returned. Holds the names of one folder a level in memory.
+class TreeWalk {
+ public:
+  struct Entry {
+    enum class Kind {
+      kFound,         ///< a file or folder, as `status` says
+      kUnknown,       ///< the system could not examine `path`: nothing is known of it
+      kUnknownBelow,  ///< the system could not read the folder `path`: nothing is known of what is in it
+    };
+    Kind kind = Kind::kFound;
+    std::string path;
+    struct stat status = {};
+  };
+
+  /// What lies below `folder`; the folder itself is not returned. The rules must outlive the walk.
+  TreeWalk(const std::string& folder, const WalkRules& rules);
+  TreeWalk(const TreeWalk&) = delete;
+  TreeWalk& operator=(const TreeWalk&) = delete;
+  ~TreeWalk();
+
+  /// False at the end; `entry` is then as it was.
+  bool Next(Entry& entry);
+
+  /// Whether the folder itself could be read.
+  bool Opened() const { return opened_; }
+  uint64_t LinksSkipped() const { return links_skipped_; }
+
+ private:
+  struct Level;
+  struct Item;
+  /// Opens and reads a folder, which is walked next. True when it could not be read and `entry` says so.
+  bool Descend(int parent_fd, const std::string& name, const std::string& path, Entry& entry);
+  void ReadNames(Level& level);
+  /// True when `entry` is to be returned.
+  bool Examine(Level& level, const Item& item, Entry& entry);
+
+  const WalkRules& rules_;
+  std::vector<std::unique_ptr<Level>> levels_;
+  uint64_t links_skipped_ = 0;
+  bool opened_ = false;
+  std::unique_ptr<Entry> first_;
+};
+
+}  // namespace ferrox::indexd

@@ -1,0 +1,37 @@
+#include "services/support/local_request.h"
+
+#include <poll.h>
+
+#include <cerrno>
+
+#include <kova/sock_connection.h>
+
+namespace ferrox::services {
+
+namespace {
+
+class Connection : public kovadaemon::DomainSockConnection {
+ public:
+  using DomainSockConnection::DomainSockConnection;
+
+  bool WaitForReply(std::chrono::seconds longest) const {
+    pollfd state = {fd_, POLLIN, 0};
+    int ready;
+    do {
+      ready = poll(&state, 1, static_cast<int>(std::chrono::milliseconds(longest).count()));
+    } while (ready < 0 && errno == EINTR);
+    return ready > 0;
+  }
+};
+
+}  // namespace
+
+RequestResult AskLocally(const std::string& socket_path, const std::string& request, std::chrono::seconds longest,
+                         std::string& reply) {
+  Connection connection(socket_path);
+  if (!connection.Connect()) return RequestResult::kNotRunning;
+  const bool answered = connection.Send(request) && connection.WaitForReply(longest) && connection.Recv(reply);
+  return answered ? RequestResult::kAnswered : RequestResult::kNoAnswer;
+}
+
+}  // namespace ferrox::services

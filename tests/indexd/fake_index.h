@@ -1,0 +1,119 @@
+#pragma once
+
+#include <sys/stat.h>
+
+#include <functional>
+#include <map>
+#include <mutex>
+#include <set>
+#include <string>
+#include <vector>
+
+#include <kova/content_extract.h>
+
+#include "common/error.h"
+#include "common/file_util.h"
+#include "services/fileindexd/share_index.h"
+
+namespace ferrox::test {
+
+/// An index in memory that behaves as the search engine is agreed to, and counts what it is asked to do.
+class FakeIndex : public indexd::ShareIndex {
+ public:
+  struct Document {
+    std::string stamp;
+    std::string content;  ///< what was read when it was last upserted
+  };
+
+  bool Exists() override { return exists; }
+  void Create() override { exists = true; }
+
+  void Upsert(const std::string& path, bool need_meta) override {
+    const Document document = {StampOf(path), need_meta ? ContentOf(path) : ""};
+    const std::lock_guard lock(mutex);
+    if (before_write) before_write(path);
+    ++upserts[path];
+    documents[path] = document;
+  }
+
+  void Attr(const std::string& path) override {
+    const std::string stamp = StampOf(path);
+    const std::lock_guard lock(mutex);
+    RequireDocument(path).stamp = stamp;
+  }
+
+  void Delete(const std::string& path) override {
+    const std::lock_guard lock(mutex);
+    documents.erase(path);
+  }
+
+  void DeleteBelow(const std::string& folder) override {
+    const std::lock_guard lock(mutex);
+    std::erase_if(documents, [&folder](const auto& item) { return StringStartWith(item.first, folder + "/"); });
+  }
+
+  void Rename(const std::string& new_path, const std::string& old_path) override {
+    const std::lock_guard lock(mutex);
+    (void)RequireDocument(old_path);
+    std::map<std::string, Document> moved;
+    for (const auto& [path, document] : documents) {
+      const bool moves = path == old_path || StringStartWith(path, old_path + "/");
+      if (moves) moved[new_path + path.substr(old_path.size())] = document;
+    }
+    std::erase_if(documents, [&old_path](const auto& item) {
+      return item.first == old_path || StringStartWith(item.first, old_path + "/");
+    });
+    for (const auto& [path, document] : moved) documents[path] = document;
+    ++renames;
+  }
+
+  void Commit() override { ++commits; }
+
+  std::vector<indexd::IndexedEntry> List(const std::string& folder, const std::string& after, unsigned limit) override {
+    const std::lock_guard lock(mutex);
+    std::vector<indexd::IndexedEntry> page;
+    for (auto at = documents.upper_bound(after.empty() ? folder + "/" : after);
+         at != documents.end() && StringStartWith(at->first, folder + "/") && page.size() < limit; ++at) {
+      page.push_back({at->first, at->second.stamp, ""});
+    }
+    return page;
+  }
+
+  std::vector<indexd::IndexedEntry> Find(const std::string& path) override {
+    const std::lock_guard lock(mutex);
+    const auto found = documents.find(path);
+    if (found == documents.end()) return {};
+    return {{path, found->second.stamp, ""}};
+  }
+
+  Json::Value Figures() override { return Json::Value(); }
+
+  std::mutex mutex;
+  bool exists = true;
+  std::map<std::string, Document> documents;
+  std::map<std::string, int> upserts;
+  int renames = 0;
+  int commits = 0;
+  std::function<void(const std::string& path)> before_write;
+
+ private:
+  static std::string StampOf(const std::string& path) {
+    struct stat status = {};
+    if (lstat(path.c_str(), &status) != 0) throw Error(Error::kParseFailed, "Parse failed, path=" + path);
+    return KOVA::CONTENT_EXTRACT::Stamp(status);
+  }
+
+  static std::string ContentOf(const std::string& path) {
+    std::string content;
+    (void)ReadWholeFile(path, content);
+    return content;
+  }
+
+  Document& RequireDocument(const std::string& path) {
+    const auto found = documents.find(path);
+    if (found == documents.end()) throw Error(Error::kEngineNoSuchDocument, "no such document");
+    return found->second;
+  }
+};
+
+}  // namespace ferrox::test
