@@ -1,0 +1,85 @@
+#include "cli/ask.h"
+
+#include "cli/command.h"
+#include "common/json_util.h"
+#include "common/paths.h"
+#include "services/support/local_request.h"
+
+namespace ferrox::cli {
+
+namespace {
+
+using services::RequestResult;
+
+/// A search that must first wait for other work still answers within this.
+constexpr std::chrono::seconds kLongestWait(120);
+
+struct Daemon {
+  const char* name;
+  const char* socket;
+};
+constexpr Daemon kEngine = {"the search engine", kElasticdSocket};
+constexpr Daemon kIndexDaemon = {"the index daemon", kFileIndexdSocket};
+
+Json::Value DataOf(const Daemon& daemon, const std::string& text) {
+  Json::Value reply;
+  bool success = false;
+  if (!fromString(reply, text) || !reply.isObject()) {
+    throw Failure(std::string(daemon.name) +
+                  " gave an answer that cannot be read; restart it ('fileindexctl down', 'up')");
+  }
+  GetJsonValue(success, reply, "success", false);
+  if (success) return reply["data"];
+  std::string message = "the request failed";
+  GetJsonValue(message, reply["error"], "msg", false);
+  throw Failure(std::string(daemon.name) + ": " + message);
+}
+
+RequestResult Ask(const Daemon& daemon, const Json::Value& request, const std::string& end, std::string& reply) {
+  return services::AskLocally(InstancePath(daemon.socket), toString(request) + end, kLongestWait, reply);
+}
+
+Json::Value Answer(const Daemon& daemon, RequestResult result, const std::string& reply) {
+  if (result == RequestResult::kNotRunning) {
+    throw Failure(std::string(daemon.name) + " does not run here (nothing answers at " + InstancePath(daemon.socket) +
+                  "); start it with 'fileindexctl up'");
+  }
+  if (result == RequestResult::kNoAnswer) {
+    throw Failure(std::string(daemon.name) + " did not answer; see its log, or restart it ('fileindexctl down', 'up')");
+  }
+  return DataOf(daemon, reply);
+}
+
+Json::Value IndexDaemonRequest(const std::string& type, const Json::Value& data) {
+  Json::Value request;
+  request["type"] = type;
+  request["data"] = data;
+  return request;
+}
+
+const std::string kTerminatingZero(1, '\0');
+
+}  // namespace
+
+Json::Value AskEngine(const std::string& command, const Json::Value& data) {
+  Json::Value request;
+  request["command"] = command;
+  request["data"] = data;
+  std::string reply;
+  const RequestResult result = Ask(kEngine, request, "", reply);
+  return Answer(kEngine, result, reply);
+}
+
+Json::Value AskIndexDaemon(const std::string& type, const Json::Value& data) {
+  std::string reply;
+  const RequestResult result = Ask(kIndexDaemon, IndexDaemonRequest(type, data), kTerminatingZero, reply);
+  return Answer(kIndexDaemon, result, reply);
+}
+
+Json::Value AskIndexDaemonIfRunning(const std::string& type, const Json::Value& data) {
+  std::string reply;
+  const RequestResult result = Ask(kIndexDaemon, IndexDaemonRequest(type, data), kTerminatingZero, reply);
+  return result == RequestResult::kNotRunning ? Json::Value() : Answer(kIndexDaemon, result, reply);
+}
+
+}  // namespace ferrox::cli

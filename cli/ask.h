@@ -1,0 +1,17 @@
+#pragma once
+
+#include <string>
+
+#include <json/value.h>
+
+namespace ferrox::cli {
+
+/// Sends one request to a daemon of this instance and returns the reply's "data".
+/// @throws Failure when the daemon does not run or does not answer, or with its own message when it refuses.
+Json::Value AskEngine(const std::string& command, const Json::Value& data);
+Json::Value AskIndexDaemon(const std::string& type, const Json::Value& data);
+
+/// The same, but null when the daemon does not run.
+Json::Value AskIndexDaemonIfRunning(const std::string& type, const Json::Value& data);
+
+}  // namespace ferrox::cli

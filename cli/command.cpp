@@ -1,0 +1,99 @@
+#include "cli/command.h"
+
+#include <algorithm>
+#include <cerrno>
+#include <cstdlib>
+
+namespace ferrox::cli {
+
+namespace {
+
+const Option kHelpOption = {"--help", nullptr, "this text"};
+
+const Option* FindOption(const Command& command, const std::string& name) {
+  for (const Option& option : command.options) {
+    if (name == option.name) return &option;
+  }
+  return name == kHelpOption.name ? &kHelpOption : nullptr;
+}
+
+/// Takes the option at `at` and leaves `at` at its last word.
+void TakeOption(const Command& command, const std::vector<std::string>& given, size_t& at, Arguments& arguments) {
+  const size_t equals = given[at].find('=');
+  const std::string name = given[at].substr(0, equals);
+  const Option* option = FindOption(command, name);
+  if (option == nullptr) throw UsageError("unknown option " + name);
+  if (option->value == nullptr) {
+    if (equals != std::string::npos) throw UsageError(name + " takes no value");
+    arguments.options[name] = "";
+  } else if (equals != std::string::npos) {
+    arguments.options[name] = given[at].substr(equals + 1);
+  } else {
+    if (at + 1 == given.size()) throw UsageError(name + " needs a value: " + name + " " + option->value);
+    arguments.options[name] = given[++at];
+  }
+}
+
+std::string OptionText(const Option& option) {
+  return option.value == nullptr ? option.name : std::string(option.name) + " " + option.value;
+}
+
+}  // namespace
+
+std::string Arguments::Get(const std::string& name, const std::string& otherwise) const {
+  const auto found = options.find(name);
+  return found == options.end() ? otherwise : found->second;
+}
+
+long long Arguments::Number(const std::string& name, long long otherwise, long long least, long long most) const {
+  if (!Has(name)) return otherwise;
+  const std::string text = Get(name);
+  char* end = nullptr;
+  errno = 0;
+  const long long number = strtoll(text.c_str(), &end, 10);
+  if (text.empty() || *end != '\0' || errno != 0 || number < least || number > most) {
+    throw UsageError(name + " takes a number from " + std::to_string(least) + " to " + std::to_string(most));
+  }
+  return number;
+}
+
+Arguments ParseArguments(const Command& command, const std::vector<std::string>& given) {
+  Arguments arguments;
+  bool options_ended = false;
+  for (size_t at = 0; at < given.size(); ++at) {
+    if (options_ended || given[at].compare(0, 2, "--") != 0) {
+      arguments.words.push_back(given[at]);
+    } else if (given[at] == "--") {
+      options_ended = true;
+    } else {
+      TakeOption(command, given, at, arguments);
+    }
+  }
+  if (arguments.Has(kHelpOption.name)) return arguments;
+  if (arguments.words.size() < command.words_min) throw UsageError("something is missing");
+  if (arguments.words.size() > command.words_max) {
+    throw UsageError("\"" + arguments.words[command.words_max] + "\" is one word too many");
+  }
+  return arguments;
+}
+
+std::string UsageLine(const Command& command) {
+  std::string line = std::string("fileindexctl ") + command.name;
+  for (const Option& option : command.options) line += " [" + OptionText(option) + "]";
+  return *command.words == '\0' ? line : line + " " + command.words;
+}
+
+std::string HelpFor(const Command& command) {
+  std::string text = "Usage: " + UsageLine(command) + "\n" + command.help + "\n";
+  std::vector<Option> options = command.options;
+  options.push_back(kHelpOption);
+  size_t width = 0;
+  for (const Option& option : options) width = std::max(width, OptionText(option).size());
+  for (const Option& option : options) {
+    const std::string left = OptionText(option);
+    text += "  " + left + std::string(width - left.size() + 3, ' ') + option.help + "\n";
+  }
+  return text;
+}
+
+}  // namespace ferrox::cli

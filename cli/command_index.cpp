@@ -1,0 +1,130 @@
+#include <poll.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <chrono>
+#include <cstdio>
+
+#include "cli/ask.h"
+#include "cli/command.h"
+#include "cli/escape.h"
+#include "cli/format.h"
+#include "cli/progress.h"
+#include "common/error.h"
+#include "fileindex/optree.h"
+#include "fileindex/queue_mgr.h"
+#include "fileindex/status_mgr.h"
+#include "fileindex/util.h"
+#include "sdk/share.h"
+
+namespace ferrox::cli {
+
+namespace {
+
+using SteadyClock = std::chrono::steady_clock;
+
+constexpr int kPollMs = 100;
+/// An error that lasts so long is told; the daemon itself goes on trying.
+constexpr std::chrono::seconds kErrorPatience(5);
+
+struct Share {
+  std::string name;
+  std::string path;
+  std::string queue_path;
+};
+
+Share OpenShare(const std::string& name) {
+  try {
+    const sdk::SDKShare share(name);
+    return {name, share.GetPath(), share.GetQueuePath()};
+  } catch (const Error& error) {
+    if (error.Code() != Error::kNoSuchShare) throw;
+    throw Failure("there is no share \"" + name + "\"; 'fileindexctl share list' shows them");
+  }
+}
+
+/// A queue with a damaged line takes no event; the library then has marked the share, which comes to the same.
+void QueueReindex(const Share& share) {
+  try {
+    fileindex::AddCustomEvent(fileindex::EVENT_REINDEX, share.path, "", Json::Value());
+  } catch (const Error& error) {
+    if (error.Code() != Error::kMalformedEvent && error.Code() != Error::kBadArgument) throw;
+  }
+}
+
+Json::Value ShareStatusOf(const std::string& name) {
+  const Json::Value status = AskIndexDaemon("status", Json::Value());
+  for (const Json::Value& share : status["shares"]) {
+    if (TextOf(share, "share") == name) return share;
+  }
+  return Json::Value();
+}
+
+bool ReindexIsPending(const Share& share, const Json::Value& status) {
+  if ((fileindex::StatusMgr().GetShareStatus(share.name) & fileindex::StatusMgr::kNeedReindex) != 0) return true;
+  try {
+    return fileindex::QueueMgr(share.queue_path).IsFullPathHasReindex(share.path);
+  } catch (const Error&) {
+    return TextOf(status, "state") != "idle" || UintOf(status, "queued") != 0;
+  }
+}
+
+/// Returns the share's last status.
+Json::Value WaitUntilDone(const Share& share) {
+  Progress progress(isatty(STDERR_FILENO) == 1);
+  auto last_good = SteadyClock::now();
+  std::string told;
+  while (true) {
+    Json::Value status = ShareStatusOf(share.name);
+    if (status.isNull())
+      throw Failure("the index daemon does not index " + share.name +
+                    "; 'fileindexctl down' and 'up' make it look again");
+    const std::string state = TextOf(status, "state");
+    if (state != "error") last_good = SteadyClock::now();
+    if (!ReindexIsPending(share, status)) return ShareStatusOf(share.name);
+    if (SteadyClock::now() - last_good > kErrorPatience) {
+      throw Failure("share " + share.name + ": " + TextOf(status, "detail") +
+                    "; the index daemon tries again by itself");
+    }
+    if (state == "paused" && told != state) {
+      (void)fprintf(stderr, "indexing is paused; it goes on after 'fileindexctl resume'\n");
+    }
+    told = state;
+    progress.Show(status);
+    (void)poll(nullptr, 0, kPollMs);
+  }
+}
+
+uint64_t Grown(const Json::Value& before, const Json::Value& after, const char* key) {
+  const uint64_t old_value = UintOf(before, key);
+  const uint64_t new_value = UintOf(after, key);
+  return new_value >= old_value ? new_value - old_value : new_value;
+}
+
+}  // namespace
+
+int RunIndex(const Arguments& arguments) {
+  const Share share = OpenShare(arguments.words[0]);
+  const auto begin = SteadyClock::now();
+  if (!arguments.Has("--wait")) {
+    QueueReindex(share);
+    (void)AskIndexDaemonIfRunning("notify_setting_changed", [&share] {
+      Json::Value data;
+      data["share_name"] = share.name;
+      data["is_upsert"] = true;
+      return data;
+    }());
+    (void)printf("queued: share %s will be compared with its index\n", EscapeForTerminal(share.name).c_str());
+    return kDone;
+  }
+  const Json::Value before = ShareStatusOf(share.name);
+  QueueReindex(share);
+  const Json::Value after = WaitUntilDone(share);
+  const std::chrono::duration<double> took = SteadyClock::now() - begin;
+  (void)printf("%s: %s files examined, %s indexed, %s removed in %s\n", EscapeForTerminal(share.name).c_str(),
+               Count(UintOf(after["comparison"], "examined")).c_str(), Count(Grown(before, after, "written")).c_str(),
+               Count(Grown(before, after, "deleted")).c_str(), Duration(took.count()).c_str());
+  return kDone;
+}
+
+}  // namespace ferrox::cli

@@ -1,0 +1,57 @@
+#include <sys/stat.h>
+
+#include <cerrno>
+#include <cstdio>
+#include <cstring>
+#include <sstream>
+
+#include "cli/command.h"
+#include "cli/escape.h"
+#include "fileindex/optree.h"
+
+namespace ferrox::cli {
+
+namespace {
+
+using OpPtr = std::shared_ptr<fileindex::OP>;
+
+void CheckReadable(const std::string& path) {
+  struct stat status = {};
+  const bool there = stat(path.c_str(), &status) == 0;
+  if (there && S_ISREG(status.st_mode)) return;
+  throw Failure(path + ": " + (there ? "not a file" : strerror(errno)) + "; give the path of a share's queue file");
+}
+
+/// The operation's own text, exactly, unless it would not stay one line.
+void PrintText(const OpPtr& op) {
+  std::ostringstream stream;
+  stream << op;
+  const std::string text = stream.str();
+  std::string safe;
+  for (const char byte : text) {
+    const auto code = static_cast<unsigned char>(byte);
+    safe += code < 0x20 || code == 0x7F ? EscapeForTerminal({&byte, 1}) : std::string(1, byte);
+  }
+  (void)printf("%s\n", safe.c_str());
+}
+
+/// The members stand in this order, so that the lines can also be read by eye.
+void PrintJson(const OpPtr& op) {
+  (void)printf("{\"op\":%d,\"node\":%s,\"path\":%s,\"data\":%s}\n", static_cast<int>(op->op),
+               ToScriptJson(op->node->GetPath()).c_str(), ToScriptJson(op->path).c_str(),
+               ToScriptJson(op->data).c_str());
+}
+
+}  // namespace
+
+int RunQueueShow(const Arguments& arguments) {
+  const std::string& path = arguments.words[0];
+  CheckReadable(path);
+  fileindex::OPTree tree(path);
+  const int count = tree.ProcessOP(arguments.Has("--json") ? &PrintJson : &PrintText);
+  if (fflush(stdout) != 0) throw Failure("standard output cannot be written");
+  (void)fprintf(stderr, "%d\n", count);
+  return kDone;
+}
+
+}  // namespace ferrox::cli

@@ -1,0 +1,87 @@
+#include <cstdio>
+#include <cstdlib>
+
+#include <kova/service.h>
+
+#include "cli/ask.h"
+#include "cli/command.h"
+#include "cli/format.h"
+#include "common/clock.h"
+#include "common/error.h"
+#include "common/paths.h"
+#include "fileindex/status_mgr.h"
+#include "platform/host/child_service.h"
+
+namespace ferrox::cli {
+
+namespace {
+
+struct Service {
+  const char* name;
+  const char* label;
+  int (*start)(const char* name, int option);
+  int (*stop)(const char* name, int option);
+  int option;
+};
+
+/// In the order in which they start; the index daemon needs the engine.
+constexpr Service kServices[] = {
+    {"kovaelasticd", "search engine", &KLIBServiceStart, &KLIBServiceStop, 1},
+    {"pkg-Ferrox-fileindexd", "index daemon", &KLIBServicectlStart, &KLIBServicectlStop, KLIB_SERVICECTL_UPSTART},
+};
+
+[[noreturn]] void ThrowProblem(const Service& service, const char* what) {
+  const std::string reason = kova::host::LastServiceProblem();
+  throw Failure(std::string("the ") + service.label + " could not be " + what + (reason.empty() ? "" : ": " + reason));
+}
+
+/// A daemon that could not be told takes the pause from the status file when it starts.
+int ReportPause(void (*change)(int hours), int hours, const std::string& report) {
+  try {
+    change(hours);
+  } catch (const Error& error) {
+    if (error.Code() != Error::kInternal) throw;
+    (void)printf("%s (the index daemon does not run; it will take note when it starts)\n", report.c_str());
+    return kDone;
+  }
+  (void)printf("%s\n", report.c_str());
+  return kDone;
+}
+
+}  // namespace
+
+int RunUp(const Arguments&) {
+  for (const Service& service : kServices) {
+    const bool ran = KLIBServiceIsRunning(service.name) == 1;
+    if (service.start(service.name, service.option) < 0) ThrowProblem(service, "started");
+    (void)printf("%s: %s\n", service.label, ran ? "runs already" : "started");
+  }
+  return kDone;
+}
+
+int RunDown(const Arguments&) {
+  for (size_t i = std::size(kServices); i-- > 0;) {
+    const Service& service = kServices[i];
+    const bool ran = KLIBServiceIsRunning(service.name) == 1;
+    if (service.stop(service.name, service.option) < 0) ThrowProblem(service, "stopped");
+    (void)printf("%s: %s\n", service.label, ran ? "stopped" : "does not run");
+  }
+  return kDone;
+}
+
+int RunPause(const Arguments& arguments) {
+  const std::string hours = arguments.words.empty() ? "0" : arguments.words[0];
+  Arguments checked;
+  checked.options["HOURS"] = hours;
+  constexpr long long kHoursMax = 24 * 365;
+  const auto length = static_cast<int>(checked.Number("HOURS", 0, 0, kHoursMax));
+  const std::string report = length == 0 ? "indexing is paused until 'fileindexctl resume'"
+                                         : "indexing is paused until " + Date(Clock::Get().Now() + 3600LL * length);
+  return ReportPause([](int value) { fileindex::StatusMgr().Pause(value); }, length, report);
+}
+
+int RunResume(const Arguments&) {
+  return ReportPause([](int) { fileindex::StatusMgr().Resume(); }, 0, "indexing goes on");
+}
+
+}  // namespace ferrox::cli

@@ -1,0 +1,71 @@
+#include "cli/progress.h"
+
+#include <sys/ioctl.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cstdio>
+
+#include "cli/escape.h"
+#include "cli/format.h"
+
+namespace ferrox::cli {
+
+namespace {
+
+constexpr std::chrono::seconds kLineInterval(2);
+constexpr size_t kBarWidth = 24;
+
+size_t TerminalColumns() {
+  winsize size = {};
+  return ioctl(STDERR_FILENO, TIOCGWINSZ, &size) == 0 && size.ws_col > 0 ? size.ws_col : 80;
+}
+
+}  // namespace
+
+Progress::Progress(bool on_terminal)
+    : on_terminal_(on_terminal), next_line_(std::chrono::steady_clock::now() + kLineInterval) {}
+
+Progress::~Progress() { Clear(); }
+
+std::string Progress::Text(const Json::Value& share, size_t bar_width) {
+  const std::string state = TextOf(share, "state");
+  if (state != "indexing") return state + (TextOf(share, "detail").empty() ? "" : ": " + TextOf(share, "detail"));
+  const Json::Value& comparison = share["comparison"];
+  if (!comparison["running"].isBool() || !comparison["running"].asBool()) return "preparing";
+  const uint64_t examined = UintOf(comparison, "examined");
+  const double seconds = static_cast<double>(UintOf(comparison, "elapsed_ms")) / 1000;
+  const double rate = seconds > 0 ? static_cast<double>(examined) / seconds : 0;
+  const std::string speed = Count(static_cast<uint64_t>(rate)) + " a second";
+  const uint64_t total = std::max(UintOf(comparison, "estimate"), examined);
+  if (!comparison["estimate_complete"].asBool() || total == 0) return Count(examined) + " files, " + speed;
+
+  const double part = static_cast<double>(examined) / static_cast<double>(total);
+  const auto filled = static_cast<size_t>(part * static_cast<double>(bar_width));
+  std::string text;
+  if (bar_width > 0) text = "[" + std::string(filled, '#') + std::string(bar_width - filled, ' ') + "] ";
+  text += std::to_string(static_cast<int>(part * 100)) + "%  " + Count(examined) + " of " + Count(total) + " files, " +
+          speed;
+  if (rate > 0) text += ", " + Duration(static_cast<double>(total - examined) / rate) + " left";
+  return text;
+}
+
+void Progress::Show(const Json::Value& share) {
+  if (on_terminal_) {
+    const std::string text = EscapeForTerminal(Text(share, kBarWidth)).substr(0, TerminalColumns() - 1);
+    (void)fprintf(stderr, "\r\033[K%s", text.c_str());
+    shown_ = true;
+    return;
+  }
+  const auto now = std::chrono::steady_clock::now();
+  if (now < next_line_) return;
+  next_line_ = now + kLineInterval;
+  (void)fprintf(stderr, "%s\n", EscapeForTerminal(Text(share, 0)).c_str());
+}
+
+void Progress::Clear() {
+  if (shown_) (void)fputs("\r\033[K", stderr);
+  shown_ = false;
+}
+
+}  // namespace ferrox::cli
