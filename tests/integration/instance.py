@@ -1,0 +1,185 @@
+"""A private instance with its real daemons, for the tests of this folder."""
+
+import fcntl
+import json
+import os
+import shutil
+import signal
+import socket
+import struct
+import subprocess
+import tempfile
+import time
+
+BIN = os.environ.get("FERROX_BIN", "")
+TIMEOUT = 120
+
+CREATE, MODIFY, ATTR, DELETE, RENAME, REINDEX = 0x40, 0x2, 0x4, 0x80, 0x100, 0x10000
+
+
+class Instance:
+    """Starts with no daemon; stop() ends what runs and removes the folder."""
+
+    def __init__(self):
+        self.root = tempfile.mkdtemp(prefix="fi-")
+        self.env = dict(os.environ, FERROX_ROOT=self.root, LC_ALL="C.UTF-8")
+        self.pids = set()
+
+    def stop(self):
+        self.note_pids()
+        subprocess.run([os.path.join(BIN, "fileindexctl"), "down"], env=self.env, stdout=subprocess.DEVNULL,
+                       stderr=subprocess.DEVNULL, timeout=TIMEOUT, check=False)
+        left = [pid for pid in self.pids if os.path.exists(f"/proc/{pid}/exe") and self.is_ours(pid)]
+        for pid in left:
+            os.kill(pid, signal.SIGKILL)
+        shutil.rmtree(self.root, ignore_errors=True)
+        return left
+
+    @staticmethod
+    def is_ours(pid):
+        try:
+            return os.path.dirname(os.readlink(f"/proc/{pid}/exe")) == os.path.realpath(BIN)
+        except OSError:
+            return False
+
+    # The tool.
+
+    def run(self, *words):
+        return subprocess.run([os.path.join(BIN, "fileindexctl"), *words], env=self.env, capture_output=True,
+                              timeout=TIMEOUT, check=False)
+
+    def ctl(self, *words, code=0):
+        done = self.run(*words)
+        assert done.returncode == code, f"{words}: exit code {done.returncode}, {done.stderr.decode(errors='replace')}"
+        self.note_pids()
+        return done.stdout
+
+    def status(self):
+        return json.loads(self.ctl("status", "--json"))
+
+    def share_status(self, name):
+        return next(s for s in self.status()["index_daemon"]["shares"] if s["share"] == name)
+
+    def search(self, *words):
+        """The paths found, as bytes, in order."""
+        done = self.run("search", "--json", "--limit", "1000", *words)
+        assert done.returncode in (0, 1), done.stderr
+        hits = json.loads(done.stdout)["hits"]
+        return [hit["doc_id"].encode("utf-8", "surrogateescape") for hit in hits]
+
+    # The daemons.
+
+    def pid(self, program):
+        with open(f"{self.root}/var/run/{program}.pid", encoding="ascii") as file:
+            return int(file.read())
+
+    def note_pids(self):
+        for program in ("kovaelasticd", "fileindexd"):
+            try:
+                self.pids.add(self.pid(program))
+            except (OSError, ValueError):
+                pass
+
+    def kill(self, program):
+        pid = self.pid(program)
+        os.kill(pid, signal.SIGKILL)
+        wait_for(lambda: is_free(f"{self.root}/var/run/{program}.pid"), f"the end of {program}")
+
+    def connect(self, daemon):
+        connection = socket.socket(socket.AF_UNIX)
+        connection.settimeout(TIMEOUT)
+        connection.connect(f"{self.root}/var/run/{daemon}.sock")
+        return connection
+
+    def ask(self, daemon, request, end=b""):
+        with self.connect(daemon) as connection:
+            body = json.dumps(request, ensure_ascii=False).encode("utf-8", "surrogateescape") + end
+            connection.sendall(struct.pack("=I", len(body)) + body)
+            return json.loads(receive(connection).decode("utf-8", "surrogateescape"))
+
+    def documents(self, share, folder):
+        """The paths of all documents below a folder, as bytes, in the index's order."""
+        query = {"qsl": {"prefix": {"KOVAMDPath": folder + "/"}}, "load_field": ["KOVAMDPath"]}
+        reply = self.ask("kovaelasticd", {"command": "document_get_by_query",
+                                          "data": {"id": "fileindex_" + share, "query": query}})
+        assert reply["success"], reply
+        return [entry["KOVAMDPath"].encode("utf-8", "surrogateescape") for entry in reply["data"]]
+
+    # Shares and queues.
+
+    def add_share(self, name):
+        folder = f"{os.path.realpath(self.root)}/vol/{name}"
+        os.makedirs(folder)
+        self.ctl("share", "add", folder)
+        return folder
+
+    def queue_path(self, folder):
+        name = folder.strip("/").replace("/", "+")
+        return f"{self.root}/var/lib/kova/fileindex/queue/{name}.queue"
+
+    def queue(self, folder, *lines):
+        """Appends lines (bytes, or dicts) as the notification daemon does: under the lock of the file that is still
+        the queue."""
+        path = self.queue_path(folder)
+        while True:
+            with open(path, "ab") as file:
+                fcntl.flock(file, fcntl.LOCK_EX)
+                try:
+                    if os.stat(path).st_ino != os.fstat(file.fileno()).st_ino:
+                        continue
+                except FileNotFoundError:
+                    continue
+                for line in lines:
+                    raw = line if isinstance(line, bytes) else json.dumps(line, ensure_ascii=False).encode(
+                        "utf-8", "surrogateescape")
+                    file.write(raw + b"\n")
+                return
+
+    def wait_idle(self, share, folder):
+        def idle():
+            state = self.share_status(share)
+            files = [self.queue_path(folder), self.queue_path(folder) + ".tmp"]
+            return state["state"] == "idle" and not any(os.path.exists(f) and os.path.getsize(f) for f in files)
+        wait_for(idle, f"share {share} to be idle")
+
+
+def event(bits, path, path_old="", is_dir=False):
+    return {"event": bits, "path": path, "path_old": path_old, "is_dir": is_dir}
+
+
+def is_free(path):
+    """Whether nobody holds the lock on a pid file: all threads of the process that had it are gone."""
+    with open(path, "rb") as file:
+        try:
+            fcntl.flock(file, fcntl.LOCK_SH | fcntl.LOCK_NB)
+        except BlockingIOError:
+            return False
+    return True
+
+
+def receive(connection):
+    def exactly(size):
+        data = b""
+        while len(data) < size:
+            part = connection.recv(size - len(data))
+            if not part:
+                raise EOFError
+            data += part
+        return data
+    return exactly(struct.unpack("=I", exactly(4))[0])
+
+
+def wait_for(condition, what, seconds=TIMEOUT):
+    end = time.monotonic() + seconds
+    while not condition():
+        assert time.monotonic() < end, f"waited in vain for {what}"
+        time.sleep(0.02)
+
+
+def on_disk(folder):
+    """What the index must hold: all below the folder but links, in the order of the bytes of the paths."""
+    found = []
+    for parent, folders, files in os.walk(os.fsencode(folder)):
+        found += [os.path.join(parent, name) for name in folders + files
+                  if not os.path.islink(os.path.join(parent, name))]
+    return sorted(found)
