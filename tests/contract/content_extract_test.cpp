@@ -5,9 +5,12 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <atomic>
 #include <filesystem>
 #include <stdexcept>
 #include <string>
+#include <thread>
+#include <vector>
 
 #include <gtest/gtest.h>
 #include <json/value.h>
@@ -70,6 +73,8 @@ const char kKorean[] = "나라의 말이 중국과 달라 문자와 서로 통�
 const char kFrench[] =
     "Le cœur a ses raisons que la raison ne connaît point. Après l'été, les élèves rentrèrent à l'école, "
     "où ils étudièrent le français, déçus d'être déjà là.\n";
+const char kCzech[] = "Příliš žluťoučký kůň úpěl ďábelské ódy. Malý princ bydlel na planetě.\n";
+const char kUkrainian[] = "Привіт, світе. Це коротке речення українською мовою, щоб перевірити кодування.\n";
 const char kGerman[] =
     "Die Straße führte über Brücken und durch Wälder; schöne Häuser säumten die Gärten, und größere Türme überragten "
     "die Dächer.\n";
@@ -96,6 +101,8 @@ TEST_F(ContentExtractTest, TextOfEveryUsualEncodingComesOutAsUtf8) {
       {"WINDOWS-1252", kFrench, ""},
       {"ISO-8859-1", kGerman, ""},
       {"ISO-8859-15", kGerman, ""},
+      {"WINDOWS-1250", kCzech, ""},
+      {"KOI8-U", kUkrainian, ""},
   };
   for (const auto& row : rows) {
     const Json::Value document = ParseBytes("text.txt", row.mark + Encode(row.text, row.encoding));
@@ -196,6 +203,28 @@ TEST_F(ContentExtractTest, HostileMarkupTakesLinearTime) {
     for (const char* name : {"x.html", "x.xml"}) (void)ParseBytes(name, repeat(piece));
   }
   // 72 MiB in all: a search that began again at each piece would run into the test's time limit.
+}
+
+TEST_F(ContentExtractTest, ThreadsDoNotDisturbEachOther) {
+  const struct {
+    const char* name;
+    const char* encoding;
+    const char* text;
+  } files[] = {
+      {"a", "KOI8-R", kRussian}, {"b", "SHIFT_JIS", kJapanese}, {"c", "GBK", kChinese}, {"d", "UTF-16LE", kFrench}};
+  for (const auto& file : files) WriteFile(dir_ / file.name, Encode(file.text, file.encoding));
+  std::atomic<int> wrong = 0;
+  std::vector<std::thread> threads;
+  for (int t = 0; t < 4; ++t) {
+    threads.emplace_back([&, t] {
+      for (int i = 0; i < 200; ++i) {
+        const auto& file = files[(t + i) % 4];
+        if (Parse(file.name)["KOVAMDTextContent"].asString() != file.text) ++wrong;
+      }
+    });
+  }
+  for (std::thread& thread : threads) thread.join();
+  EXPECT_EQ(0, wrong);
 }
 
 TEST_F(ContentExtractTest, LongTextIsCutAtACharacter) {

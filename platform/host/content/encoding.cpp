@@ -7,7 +7,9 @@
 #include <array>
 #include <cerrno>
 #include <cstring>
+#include <map>
 #include <memory>
+#include <mutex>
 
 #include "platform/host/content/utf8.h"
 
@@ -39,40 +41,54 @@ size_t CountHighBytes(std::string_view bytes) {
   return static_cast<size_t>(std::count_if(bytes.begin(), bytes.end(), [](char c) { return (c & 0x80) != 0; }));
 }
 
-/// A converter to UTF-8. Opening one costs more than converting a small file, so each thread keeps its last.
-class Converter {
+/// A thread's converters to UTF-8. Opening one loads a library, which costs more than converting a small file, so they
+/// are kept.
+class Converters {
  public:
-  static iconv_t Get(const std::string& encoding) {
-    thread_local Converter last;
-    if (last.handle_ == kNone || last.encoding_ != encoding) {
-      last.Close();
-      last.encoding_ = encoding;
-      last.handle_ = iconv_open("UTF-8", encoding.c_str());
-    } else {
-      (void)iconv(last.handle_, nullptr, nullptr, nullptr, nullptr);
-    }
-    return last.handle_;
-  }
-
   static inline const iconv_t kNone = reinterpret_cast<iconv_t>(-1);
 
-  ~Converter() { Close(); }
-
- private:
-  void Close() {
-    if (handle_ != kNone) (void)iconv_close(handle_);
-    handle_ = kNone;
+  /// A converter in its initial state; kNone when there is no such encoding.
+  static iconv_t Get(const std::string& encoding) {
+    thread_local Converters mine;
+    const auto found = mine.open_.find(encoding);
+    if (found == mine.open_.end()) return mine.Open(encoding);
+    if (found->second != kNone) (void)iconv(found->second, nullptr, nullptr, nullptr, nullptr);
+    return found->second;
   }
 
-  std::string encoding_;
-  iconv_t handle_ = kNone;
+  ~Converters() { CloseAll(); }
+
+ private:
+  static constexpr size_t kKeptMax = 16;  // the content names encodings, and it may name many
+
+  /// The C library loads and unloads under a lock of its own, which the thread sanitizer cannot see.
+  static std::mutex& LoadMutex() {
+    static auto* mutex = new std::mutex;  // never freed: threads may end after main
+    return *mutex;
+  }
+
+  iconv_t Open(const std::string& encoding) {
+    if (open_.size() >= kKeptMax) CloseAll();
+    const std::lock_guard<std::mutex> guard(LoadMutex());
+    return open_[encoding] = iconv_open("UTF-8", encoding.c_str());
+  }
+
+  void CloseAll() {
+    const std::lock_guard<std::mutex> guard(LoadMutex());
+    for (const auto& [name, converter] : open_) {
+      if (converter != kNone) (void)iconv_close(converter);
+    }
+    open_.clear();
+  }
+
+  std::map<std::string, iconv_t> open_;
 };
 
 /// Converts to UTF-8. What is not valid becomes U+FFFD; false when that is more than one byte in a hundred, or there is
 /// no such encoding. A character cut off at the end is dropped when `cut`.
 bool Convert(std::string_view bytes, const std::string& encoding, bool cut, std::string& text) {
-  const iconv_t converter = Converter::Get(encoding);
-  if (converter == Converter::kNone) return false;
+  const iconv_t converter = Converters::Get(encoding);
+  if (converter == Converters::kNone) return false;
   text.clear();
   text.reserve(bytes.size() + bytes.size() / 2);
   size_t bad = 0;
@@ -233,6 +249,7 @@ std::string Usual(const std::string& encoding) {
       {"TIS-620", "WINDOWS-874"},
       {"ISO-8859-11", "WINDOWS-874"},
       {"BIG5", "BIG5-HKSCS"},
+      {"KOI8-R", "KOI8-U"},
   };
   std::string name = encoding;
   for (char& c : name) {
@@ -242,6 +259,20 @@ std::string Usual(const std::string& encoding) {
     if (name == narrow) return wide;
   }
   return name;
+}
+
+/// The Windows encoding in whose place an ISO one was detected: text has no use for the ISO's 32 control characters,
+/// where the Windows one has letters and quotation marks.
+std::string WithWindowsLetters(const std::string& detected, std::string_view bytes) {
+  static constexpr std::pair<const char*, const char*> kWindows[] = {
+      {"ISO-8859-2", "WINDOWS-1250"},  {"ISO-8859-7", "WINDOWS-1253"}, {"ISO-8859-8", "WINDOWS-1255"},
+      {"ISO-8859-13", "WINDOWS-1257"}, {"ISO-8859-15", kWestern},      {"ISO-8859-6", "WINDOWS-1256"},
+  };
+  const bool has_letters = std::any_of(bytes.begin(), bytes.end(), [](char c) { return (c & 0xE0) == 0x80; });
+  for (const auto& [iso, windows] : kWindows) {
+    if (has_letters && detected == iso) return windows;
+  }
+  return detected;
 }
 
 /// Whether few bytes are enough to believe in this encoding rather than in Western: those that are in wide use.
@@ -255,7 +286,7 @@ bool IsCommon(const std::string& encoding) {
 /// Detects the encoding by statistics. What nothing identifies is read as Western, the commonest.
 bool Guess(std::string_view bytes, bool cut, DecodedText& decoded) {
   const std::string_view telling = TellingPart(bytes);
-  const std::string detected = Usual(Detect(telling));
+  const std::string detected = WithWindowsLetters(Usual(Detect(telling)), telling);
   const bool sure = CountHighBytes(telling) >= kSureFromBytes;
   const bool usable = !detected.empty() && detected.find("UTF-") != 0 && (sure || IsCommon(detected));
   if (usable && Convert(bytes, detected, cut, decoded.text)) {
