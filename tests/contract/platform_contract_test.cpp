@@ -18,6 +18,7 @@
 #include <kova/sock_connection.h>
 #include <kova/user.h>
 
+#include "platform/base/index_paths.h"
 #include "platform/base/records.h"
 #include "tests/contract/frame_peer.h"
 #include "tests/contract/platform_setup.h"
@@ -191,6 +192,7 @@ TEST_F(PlatformContractTest, NoTwoSharesHaveTheSameIndexFiles) {
     }
   }
   EXPECT_EQ(Composed(&FILEIDXQueuePathCompose, "/v/a"), Composed(&FILEIDXQueuePathCompose, "/v/a/"));
+  EXPECT_EQ("srv+C%2B%2B%20tips", kova::EscapeSharePath("/srv/C++ tips")) << "the form on disk never changes";
   EXPECT_EQ("-", Composed(&FILEIDXQueuePathCompose, "v/a"));
   EXPECT_EQ("-", Composed(&FILEIDXDBPathCompose, ""));
   char id[15];

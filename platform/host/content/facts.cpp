@@ -7,7 +7,7 @@
 #include <cstring>
 #include <stdexcept>
 
-#include "platform/host/content/stamp.h"
+#include "platform/base/stamp.h"
 
 namespace kova::content {
 
