@@ -47,7 +47,7 @@ bool SyncFolderOf(const std::string& path) {
 bool WriteNewFile(const std::string& path, std::string_view content, const struct stat* old) {
   const UniqueFd file(open(path.c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC | O_NOFOLLOW, 0600));
   if (!file.Valid()) return false;
-  if (old != nullptr && fchown(file.Get(), old->st_uid, old->st_gid) != 0 && errno != EPERM) return false;
+  if (old != nullptr && fchown(file.Get(), old->st_uid, old->st_gid) != 0) errno = 0;  // not everybody may
   const mode_t mode = old != nullptr ? (old->st_mode & 0777) : 0644;
   return fchmod(file.Get(), mode) == 0 && WriteAll(file.Get(), content) && fsync(file.Get()) == 0;
 }

@@ -123,7 +123,9 @@ TEST_F(FileUtilTest, KilledWritersLeaveNoHalfFile) {
   ASSERT_TRUE(WriteWholeFile(path, contents[0]));
   for (int round = 0; round < 20; ++round) {
     const pid_t writer = fork();
-    for (size_t i = 0; writer == 0; ++i) (void)WriteWholeFile(path, contents[i % 2]);
+    if (writer == 0) {
+      for (size_t i = 0;; ++i) (void)WriteWholeFile(path, contents[i % 2]);
+    }
     (void)usleep(static_cast<useconds_t>(500 * round));
     (void)kill(writer, SIGKILL);
     (void)waitpid(writer, nullptr, 0);
