@@ -38,7 +38,7 @@ void PrintShare(const Json::Value& share) {
   (void)printf("    queued: %s%s\n", Count(UintOf(share, "queued")).c_str(),
                oldest == 0 ? "" : (", the oldest for " + Duration(static_cast<double>(age))).c_str());
   if (index.isObject() && index["extract_errors"].isObject()) {
-    PrintReasons("indexed by name only", index["extract_errors"], share["unread_examples"]);
+    PrintReasons("indexed by name only", index["extract_errors"], index["extract_error_examples"]);
   }
   Json::Value counts(Json::objectValue);
   Json::Value examples(Json::objectValue);

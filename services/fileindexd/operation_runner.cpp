@@ -26,6 +26,10 @@ constexpr auto kCommitInterval = std::chrono::seconds(5);
 /// A comparison that has seen so many files tells how many there are.
 constexpr uint64_t kFilesBeforeCount = 500;
 
+bool IsCurrent(const IndexedEntry& indexed, const struct stat& status) {
+  return indexed.stamp == KOVA::CONTENT_EXTRACT::Stamp(status);
+}
+
 enum class Presence { kThere, kGone, kUnknown };
 
 /// What is at `path` for the index: links count as nothing.
@@ -101,9 +105,11 @@ void OperationRunner::Commit() {
   last_commit_ = std::chrono::steady_clock::now();
 }
 
+/// What is there again is compared instead: of a file that a folder has replaced, the queue keeps the delete alone.
 void OperationRunner::OnDelete(const std::string& path, const std::string&) {
+  struct stat status = {};
+  if (Look(path, status) != Presence::kGone) return Compare(path);
   Enter(Phase::kDeletes);
-  if (path == context_.root) return;
   tasks_.Submit([this, path] { RemoveTree(path); });
 }
 
@@ -129,6 +135,7 @@ void OperationRunner::OnAttr(const std::string& path, const std::string&) {
 /// The documents move; what the rename brings into the index, or takes out of it, is compared or removed instead.
 void OperationRunner::OnRename(const std::string& path, const std::string& old_path) {
   tasks_.Wait();
+  compared_.clear();
   const bool wanted = path != context_.root && rules_.CanBeIndexed(path);
   const bool was_wanted = old_path != context_.root && rules_.CanBeIndexed(old_path);
   const bool moves = wanted && was_wanted && !context_.replay && MoveDocuments(path, old_path);
@@ -158,7 +165,15 @@ void OperationRunner::RefreshRenamed(const std::string& path, const std::string&
   tasks_.Submit([this, path, same_kind] { same_kind ? RefreshAttributes(path) : Write(path); });
 }
 
-void OperationRunner::OnReindex(const std::string& path, const std::string&) { Compare(path); }
+/// A folder that is copied leaves a reindex for each of its subfolders. All changes of this queue are older than its
+/// first comparison, so what was compared once need not be again, unless a rename has brought old documents there.
+void OperationRunner::OnReindex(const std::string& path, const std::string&) {
+  for (std::string folder = path; folder.size() >= context_.root.size(); folder = Dirname(folder)) {
+    if (compared_.count(folder) != 0) return;
+  }
+  Compare(path);
+  compared_.insert(path);
+}
 
 void OperationRunner::OnFullReindex(const std::string&, const std::string&) { Compare(context_.root); }
 
@@ -259,9 +274,7 @@ void OperationRunner::CompareFolder(const std::string& folder) {
 
 ComparisonActions OperationRunner::Actions(const std::string& folder) {
   ComparisonActions actions;
-  actions.is_current = [this](const IndexedEntry& entry, const struct stat& status) {
-    return IsCurrent(entry, status);
-  };
+  actions.is_current = &IsCurrent;
   actions.write = [this](const std::string& path, const struct stat&) { tasks_.Submit([this, path] { Write(path); }); };
   actions.remove = [this](const std::string& path) { tasks_.Submit([this, path] { Remove(path); }); };
   const auto count = std::make_shared<std::unique_ptr<FileCount>>();
@@ -272,12 +285,6 @@ ComparisonActions OperationRunner::Actions(const std::string& folder) {
     CommitIfDue();
   };
   return actions;
-}
-
-bool OperationRunner::IsCurrent(const IndexedEntry& indexed, const struct stat& status) {
-  const bool current = indexed.stamp == KOVA::CONTENT_EXTRACT::Stamp(status);
-  if (current && !indexed.extract_error.empty()) context_.status.NoteUnreadContent(indexed.extract_error, indexed.path);
-  return current;
 }
 
 }  // namespace ferrox::indexd

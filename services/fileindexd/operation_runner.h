@@ -4,6 +4,7 @@
 
 #include <atomic>
 #include <chrono>
+#include <set>
 #include <string>
 
 #include "common/error.h"
@@ -74,12 +75,12 @@ class OperationRunner {
   void CompareOne(const std::string& path, const struct stat& status);
   void CompareFolder(const std::string& folder);
   ComparisonActions Actions(const std::string& folder);
-  bool IsCurrent(const IndexedEntry& indexed, const struct stat& status);
 
   PassContext context_;
   PathRules rules_;
   TaskGroup tasks_;
   Phase phase_ = Phase::kWrites;
+  std::set<std::string> compared_;  ///< since the last rename
   std::atomic<bool> uncommitted_{false};
   std::chrono::steady_clock::time_point last_commit_ = std::chrono::steady_clock::now();
 };

@@ -12,7 +12,6 @@ namespace ferrox::indexd {
 struct IndexedEntry {
   std::string path;
   std::string stamp;
-  std::string extract_error;  ///< why its content could not be read, or ""
 };
 
 /// One share's index, as the daemon's work needs it; every call may throw what the engine's commands do. Several

@@ -1,6 +1,5 @@
 #include "services/fileindexd/share_status.h"
 
-#include <algorithm>
 #include <chrono>
 
 #include "common/clock.h"
@@ -84,15 +83,6 @@ void ShareStatus::AddFailure(const std::string& reason, const std::string& path)
   if (failure.examples.size() < kExamplesKept) failure.examples.push_back(path);
 }
 
-void ShareStatus::NoteUnreadContent(const std::string& reason, const std::string& path) {
-  const std::lock_guard lock(mutex_);
-  if (unread_examples_.count(reason) == 0 && unread_examples_.size() >= kReasonsKept) return;
-  std::vector<std::string>& examples = unread_examples_[reason];
-  if (examples.size() < kExamplesKept && std::count(examples.begin(), examples.end(), path) == 0) {
-    examples.push_back(path);
-  }
-}
-
 void ShareStatus::Committed() {
   const std::lock_guard lock(mutex_);
   last_commit_ = Clock::Get().Now();
@@ -127,10 +117,6 @@ Json::Value ShareStatus::ToJson() const {
     Json::Value& entry = json["failures"][reason];
     entry["count"] = Json::UInt64(failure.count);
     for (const std::string& path : failure.examples) entry["examples"].append(path);
-  }
-  json["unread_examples"] = Json::Value(Json::objectValue);
-  for (const auto& [reason, paths] : unread_examples_) {
-    for (const std::string& path : paths) json["unread_examples"][reason].append(path);
   }
   return json;
 }

@@ -35,8 +35,6 @@ class ShareStatus {
   void LinksSkipped(uint64_t count) { Add(links_skipped_, count); }
   /// A file that could not be indexed as it should; it did not stop the work.
   void AddFailure(const std::string& reason, const std::string& path);
-  /// An example of a file whose content could not be read, as the index has it; the index keeps the counts.
-  void NoteUnreadContent(const std::string& reason, const std::string& path);
   void Committed();
 
   /// The members are described in docs/formats/daemon.md.
@@ -66,7 +64,6 @@ class ShareStatus {
   uint64_t links_skipped_ = 0;
   int64_t last_commit_ = 0;
   std::map<std::string, Failure> failures_;
-  std::map<std::string, std::vector<std::string>> unread_examples_;
 };
 
 }  // namespace ferrox::indexd

@@ -106,6 +106,10 @@ Json::Value OnIndexStat(CommandCall& call) {
   result["uncommitted"] = Json::Int64(open.index->Uncommitted());
   result["extract_errors"] = Json::Value(Json::objectValue);
   for (const auto& [reason, count] : stat.extract_errors) result["extract_errors"][reason] = Json::Int64(count);
+  result["extract_error_examples"] = Json::Value(Json::objectValue);
+  for (const auto& [reason, paths] : stat.extract_error_examples) {
+    result["extract_error_examples"][reason] = Vec2JsonArr(paths);
+  }
   return result;
 }
 

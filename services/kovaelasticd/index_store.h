@@ -57,6 +57,7 @@ struct StoreStat {
   int64_t bytes_on_disk = 0;
   int64_t text_bytes = 0;
   std::map<std::string, int64_t> extract_errors;
+  std::map<std::string, std::vector<std::string>> extract_error_examples;  ///< of each reason, one or two paths
 };
 
 /// One index: its documents, and what finds them. Changes, Get and Commit are for one thread at a time; Search and Stat

@@ -161,9 +161,15 @@ StoreStat SqliteStore::Stat() {
     stat.documents = totals.documents;
     stat.with_content = totals.with_content;
     stat.text_bytes = totals.text_bytes;
-    Statement errors =
-        reader->database.Prepare("SELECT error, count(*) FROM docs WHERE error IS NOT NULL GROUP BY error");
-    while (errors.Step()) stat.extract_errors[std::string(errors.Text(0))] = errors.Int(1);
+    Statement errors = reader->database.Prepare(
+        "SELECT error, count(*), min(path), max(path) FROM docs WHERE error IS NOT NULL GROUP BY error");
+    while (errors.Step()) {
+      const std::string reason(errors.Text(0));
+      stat.extract_errors[reason] = errors.Int(1);
+      for (int column = 2; column <= (errors.Int(1) == 1 ? 2 : 3); ++column) {
+        stat.extract_error_examples[reason].emplace_back(errors.Text(column));
+      }
+    }
   }
   ReturnReader(std::move(reader));
   for (const char* suffix : {"", "-wal", "-shm"}) {

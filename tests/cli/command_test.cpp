@@ -34,7 +34,9 @@ TEST(ProgressTest, TextGrowsWithWhatIsKnown) {
   share["detail"] = "less than 100 MiB";
   EXPECT_EQ("waiting for space: less than 100 MiB", Progress::Text(share, 4));
   share["state"] = "indexing";
-  EXPECT_EQ("preparing", Progress::Text(share, 4));
+  share["operations"] = 1200;
+  share["operations_done"] = 7;
+  EXPECT_EQ("7 of 1,200 changes", Progress::Text(share, 4));
   Json::Value& comparison = share["comparison"];
   comparison["running"] = true;
   comparison["examined"] = 1500;

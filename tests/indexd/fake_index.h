@@ -71,10 +71,11 @@ class FakeIndex : public indexd::ShareIndex {
 
   std::vector<indexd::IndexedEntry> List(const std::string& folder, const std::string& after, unsigned limit) override {
     const std::lock_guard lock(mutex);
+    ++lists;
     std::vector<indexd::IndexedEntry> page;
     for (auto at = documents.upper_bound(after.empty() ? folder + "/" : after);
          at != documents.end() && StringStartWith(at->first, folder + "/") && page.size() < limit; ++at) {
-      page.push_back({at->first, at->second.stamp, ""});
+      page.push_back({at->first, at->second.stamp});
     }
     return page;
   }
@@ -83,7 +84,7 @@ class FakeIndex : public indexd::ShareIndex {
     const std::lock_guard lock(mutex);
     const auto found = documents.find(path);
     if (found == documents.end()) return {};
-    return {{path, found->second.stamp, ""}};
+    return {{path, found->second.stamp}};
   }
 
   Json::Value Figures() override { return Json::Value(); }
@@ -93,6 +94,7 @@ class FakeIndex : public indexd::ShareIndex {
   std::map<std::string, Document> documents;
   std::map<std::string, int> upserts;
   int renames = 0;
+  int lists = 0;
   int commits = 0;
   std::function<void(const std::string& path)> before_write;
 

@@ -122,6 +122,11 @@ TEST_F(ShareWorkerTest, EachOperationGivesTheStateOfTheDisk) {
   EXPECT_EQ(1, index->upserts[At("old/deep/a")]);
   EXPECT_EQ(0, index->upserts[At("moved/deep/a")]) << "a rename moves documents without reading files";
 
+  fs::remove(At("new"));
+  test::WriteFile(At("new/inside"), "a folder in the place of a file");
+  Process(Line(kDelete, At("new")) + Line(kCreate, At("new"), "", true));
+  EXPECT_EQ(OnDisk(), Indexed());
+
   fs::remove_all(At("moved"));
   test::WriteFile(At("lost"), "the event of this was lost");
   Process(Line(kCrashed, root));
@@ -138,6 +143,18 @@ TEST_F(ShareWorkerTest, ReindexTouchesOnlyWhatDiffers) {
   Process(Line(kReindex, root));
   EXPECT_EQ(OnDisk(), Indexed());
   EXPECT_EQ((std::map<std::string, int>{{At("d3/f3"), 1}, {At("d4"), 1}}), index->upserts);
+}
+
+TEST_F(ShareWorkerTest, CopiedTreeIsComparedOnce) {
+  std::string lines;
+  std::string name = "d";
+  for (int depth = 0; depth < 50; ++depth, name += "/d") {
+    test::WriteFile(At(name + "/f"), "x");
+    lines += Line(kCreate, At(name), "", true);
+  }
+  Process(lines);
+  EXPECT_EQ(OnDisk(), Indexed());
+  EXPECT_LE(index->lists, 2);
 }
 
 TEST_F(ShareWorkerTest, WhatIsNotIndexedIsTakenOut) {
