@@ -20,8 +20,8 @@ namespace KOVA::CONTENT_EXTRACT {
 std::string Stamp(const struct stat& status) {
   using kova::Nanoseconds;
   return kova::StampText(static_cast<uint64_t>(status.st_size),
-                                  Nanoseconds(status.st_mtim.tv_sec, status.st_mtim.tv_nsec),
-                                  Nanoseconds(status.st_ctim.tv_sec, status.st_ctim.tv_nsec), status.st_ino);
+                         Nanoseconds(status.st_mtim.tv_sec, status.st_mtim.tv_nsec),
+                         Nanoseconds(status.st_ctim.tv_sec, status.st_ctim.tv_nsec), status.st_ino);
 }
 
 }  // namespace KOVA::CONTENT_EXTRACT

@@ -95,7 +95,9 @@ bool Copy(const std::string& src, const std::string& dst, bool overwrite) {
 
 bool Move(const std::string& src, const std::string& dst, bool overwrite) {
   if (Publish(src, dst, overwrite)) return true;
-  return errno == EXDEV && Copy(src, dst, overwrite) && unlink(src.c_str()) == 0;
+  // To another file system. What could not be taken away afterwards is not copied first.
+  return errno == EXDEV && faccessat(AT_FDCWD, kova::host::FolderOf(src).c_str(), W_OK, AT_EACCESS) == 0 &&
+         Copy(src, dst, overwrite) && unlink(src.c_str()) == 0;
 }
 
 }  // namespace

@@ -38,7 +38,7 @@ void AddSizesAndDates(const struct statx& info, Json::Value& document) {
   document["KOVAMDFSContentChangeDate"] = static_cast<Json::Int64>(info.stx_mtime.tv_sec);
   document["KOVAMDContentModificationDate"] = static_cast<Json::Int64>(info.stx_mtime.tv_sec);
   document["KOVAMDAttributeChangeDate"] = static_cast<Json::Int64>(info.stx_ctime.tv_sec);
-  if ((info.stx_mask & STATX_BTIME) != 0) {
+  if ((info.stx_mask & STATX_BTIME) != 0 && info.stx_btime.tv_sec != 0) {  // 0: made by an image builder, not known
     document["KOVAMDFSCreationDate"] = static_cast<Json::Int64>(info.stx_btime.tv_sec);
   }
 }
