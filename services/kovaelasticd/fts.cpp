@@ -88,40 +88,62 @@ struct PhraseVisit {
   bool content;  ///< the table of contents, which has one column
 };
 
-int VisitRow(const Fts5ExtensionApi* api, Fts5Context* row, void* user) {
-  const auto* visit = static_cast<const PhraseVisit*>(user);
+/// Adds up one phrase's occurrences in a row.
+int ReadRowHits(const Fts5ExtensionApi* api, Fts5Context* row, int phrase, uint8_t& count, uint8_t& places) {
   Fts5PhraseIter iterator;
   int column = -1;
   int offset = -1;
-  const int result = api->xPhraseFirst(row, 0, &iterator, &column, &offset);
+  const int result = api->xPhraseFirst(row, phrase, &iterator, &column, &offset);
   if (result != SQLITE_OK) return result;
-  uint8_t count = 0;
-  uint8_t places = 0;
   for (; column >= 0 && count < kCountMax; api->xPhraseNext(row, &iterator, &column, &offset)) {
     ++count;
-    if (!visit->content) places |= PlaceOfColumn(column);
+    places |= PlaceOfColumn(column);
   }
-  visit->collector->Add(api->xRowid(row), visit->content ? count : uint8_t{0}, places);
   return SQLITE_OK;
 }
 
-/// kova_collect(table, collector): walks all rows of each phrase of the expression, in place of the caller's cursor.
+int VisitRow(const Fts5ExtensionApi* api, Fts5Context* row, void* user) {
+  const auto* visit = static_cast<const PhraseVisit*>(user);
+  uint8_t count = 0;
+  uint8_t places = 0;
+  const int result = ReadRowHits(api, row, 0, count, places);
+  if (result != SQLITE_OK) return result;
+  visit->collector->Add(api->xRowid(row), visit->content ? count : uint8_t{0}, visit->content ? uint8_t{0} : places);
+  return SQLITE_OK;
+}
+
+/// Hands the row under the caller's cursor to the collector.
+int CollectRow(const Fts5ExtensionApi* api, Fts5Context* row, PhraseVisit& visit) {
+  uint8_t count = 0;
+  uint8_t places = 0;
+  for (int phrase = 0; phrase < api->xPhraseCount(row); ++phrase) {
+    const int result = ReadRowHits(api, row, phrase, count, places);
+    if (result != SQLITE_OK) return result;
+  }
+  visit.collector->Add(api->xRowid(row), visit.content ? count : uint8_t{0}, visit.content ? uint8_t{0} : places);
+  return SQLITE_OK;
+}
+
+/// kova_collect(table, collector, all): with `all` not 0, walks all rows of each phrase of the expression, in place of
+/// the caller's cursor; else takes the row under the cursor.
 void CollectFunction(const Fts5ExtensionApi* api, Fts5Context* row, sqlite3_context* context, int count,
                      sqlite3_value** arguments) {
   auto* collector =
-      count == 1 ? static_cast<HitCollector*>(sqlite3_value_pointer(arguments[0], kCollectorType)) : nullptr;
+      count == 2 ? static_cast<HitCollector*>(sqlite3_value_pointer(arguments[0], kCollectorType)) : nullptr;
   if (collector == nullptr) {
     sqlite3_result_error(context, "kova_collect is for the engine alone", -1);
     return;
   }
   PhraseVisit visit = {collector, api->xColumnCount(row) == 1};
-  for (int phrase = 0; phrase < api->xPhraseCount(row); ++phrase) {
-    const int result = api->xQueryPhrase(row, phrase, &visit, &VisitRow);
-    if (result != SQLITE_OK) {
-      sqlite3_result_error_code(context, result);
-      return;
+  int result = SQLITE_OK;
+  if (sqlite3_value_int(arguments[1]) == 0) {
+    result = CollectRow(api, row, visit);
+  } else {
+    for (int phrase = 0; phrase < api->xPhraseCount(row) && result == SQLITE_OK; ++phrase) {
+      result = api->xQueryPhrase(row, phrase, &visit, &VisitRow);
     }
   }
+  if (result != SQLITE_OK) sqlite3_result_error_code(context, result);
 }
 
 fts5_api* FullTextApi(Database& database) {
@@ -164,12 +186,17 @@ std::string PhraseExpression(const std::vector<std::string>& words, bool prefix)
   return prefix ? expression + " *" : expression;
 }
 
-void Collect(Database& database, const char* table, const std::string& expression, HitCollector& collector) {
+void Collect(Database& database, const char* table, const std::string& expression, bool prefix,
+             HitCollector& collector) {
   const std::string name(table);
+  // To look for the beginning of a word, all words that have it are merged: that is done once, for the cursor.
+  // Otherwise the rows are walked inside the function, which costs less a row.
+  const std::string where = " FROM " + name + " WHERE " + name + " MATCH ?2";
   Statement statement =
-      database.Prepare("SELECT kova_collect(" + name + ", ?1) FROM " + name + " WHERE " + name + " MATCH ?2 LIMIT 1");
+      database.Prepare("SELECT kova_collect(" + name + ", ?1, " + (prefix ? "0)" + where : "1)" + where + " LIMIT 1"));
   statement.BindPointer(1, &collector, kCollectorType).Bind(2, std::string_view(expression));
-  (void)statement.Step();
+  while (statement.Step()) {
+  }
 }
 
 }  // namespace ferrox::engine

@@ -46,7 +46,9 @@ void RegisterFullText(Database& database);
 /// The expression for the words as a phrase, in the full-text language; `prefix` holds for the last one.
 std::string PhraseExpression(const std::vector<std::string>& words, bool prefix);
 
-/// Hands every document that the expression finds in the full-text table `table` to `collector`.
-void Collect(Database& database, const char* table, const std::string& expression, HitCollector& collector);
+/// Hands every document that the expression finds in the full-text table `table` to `collector`. `prefix` tells that it
+/// looks for the beginning of a word.
+void Collect(Database& database, const char* table, const std::string& expression, bool prefix,
+             HitCollector& collector);
 
 }  // namespace ferrox::engine

@@ -219,8 +219,8 @@ void Searcher::CollectWords(const QueryNode& node, HitCollector& content, HitCol
     AppendOr(meta_expression, (names_only ? "{name} : " : "{name title text} : ") + phrase);
     if (names_only || !node.phrase) AppendOr(meta_expression, GramExpression(node.text));
   }
-  if (in_content) Collect(reader_.database, "content_fts", phrase, content);
-  if (!meta_expression.empty()) Collect(reader_.database, "meta_fts", meta_expression, meta);
+  if (in_content) Collect(reader_.database, "content_fts", phrase, words.prefix, content);
+  if (!meta_expression.empty()) Collect(reader_.database, "meta_fts", meta_expression, words.prefix, meta);
 }
 
 DocSet Searcher::EvaluateWords(const QueryNode& node, bool ranking) {
