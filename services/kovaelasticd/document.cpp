@@ -145,7 +145,7 @@ void AppendTexts(std::string& out, const Json::Value& value) {
   } else if (value.isString()) {
     out += value.asString();
     out += '\n';
-  } else if (value.isIntegral()) {
+  } else if (value.isInt64()) {
     out += std::to_string(value.asInt64());
     out += '\n';
   }

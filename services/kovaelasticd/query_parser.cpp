@@ -1,6 +1,3 @@
-#include <grp.h>
-#include <pwd.h>
-
 #include <algorithm>
 
 #include "common/log.h"
@@ -161,7 +158,7 @@ class Parser {
     }
     const Value value = ParseValue();
     if (!name.empty() && value.text.empty()) Refuse(begin, "\"" + name + ":\" needs a value behind it; add one");
-    QueryNode node = name.empty() ? TextNode(value) : FieldNode(name, begin, value);
+    QueryNode node = name.empty() ? WordsNode(QueryNode::Type::kText, value) : FieldNode(name, begin, value);
     if (node.type != QueryNode::Type::kAll && ++terms_ > kQueryMaxTerms) {
       Refuse(begin, "there are more than " + std::to_string(kQueryMaxTerms) + " conditions; leave some out");
     }
@@ -192,11 +189,6 @@ class Parser {
   }
 
   static bool IsOneOfSpecial(char c) { return c == '(' || c == ')' || c == '"'; }
-
-  QueryNode TextNode(const Value& value) {
-    QueryNode node = WordsNode(QueryNode::Type::kText, value);
-    return node;
-  }
 
   /// A node for words; one that asks for nothing when there is no letter or digit in them.
   QueryNode WordsNode(QueryNode::Type type, const Value& value) {
@@ -251,16 +243,17 @@ class Parser {
 
   std::string UserNumber(const Value& value) {
     if (value.text.find_first_not_of("0123456789") == std::string::npos) return value.text;
-    const passwd* user = getpwnam(value.text.c_str());
-    if (user == nullptr) Refuse(value.begin, "there is no user \"" + value.text + "\"; give a user's name or number");
-    return std::to_string(user->pw_uid);
+    const std::optional<int64_t> number = UserNumberOf(value.text);
+    if (!number.has_value())
+      Refuse(value.begin, "there is no user \"" + value.text + "\"; give a user's name or number");
+    return std::to_string(*number);
   }
 
   std::string GroupNumber(const Value& value) {
     if (value.text.find_first_not_of("0123456789") == std::string::npos) return value.text;
-    const group* found = getgrnam(value.text.c_str());
-    if (found == nullptr) Refuse(value.begin, "there is no group \"" + value.text + "\"; give its name or number");
-    return std::to_string(found->gr_gid);
+    const std::optional<int64_t> number = GroupNumberOf(value.text);
+    if (!number.has_value()) Refuse(value.begin, "there is no group \"" + value.text + "\"; give its name or number");
+    return std::to_string(*number);
   }
 
   QueryNode NameNode(Value value) {

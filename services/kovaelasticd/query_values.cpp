@@ -1,5 +1,8 @@
 #include "services/kovaelasticd/query_values.h"
 
+#include <grp.h>
+#include <pwd.h>
+
 #include <algorithm>
 #include <ctime>
 #include <limits>
@@ -14,6 +17,7 @@ namespace {
 constexpr int64_t kMin = std::numeric_limits<int64_t>::min();
 constexpr int64_t kMax = std::numeric_limits<int64_t>::max();
 constexpr int64_t kDaySec = 86400;
+constexpr size_t kAccountBufferBytes = 64 << 10;
 
 /// Reads the digits at the front and takes them off; nothing when there are none or too many.
 std::optional<int64_t> TakeNumber(std::string_view& text, size_t digits_max) {
@@ -181,6 +185,22 @@ std::vector<std::string> FriendlyFields(std::string_view name) {
     if (lower == known.name) return known.fields;
   }
   return {};
+}
+
+std::optional<int64_t> UserNumberOf(const std::string& name) {
+  std::vector<char> buffer(kAccountBufferBytes);
+  passwd record = {};
+  passwd* found = nullptr;
+  (void)getpwnam_r(name.c_str(), &record, buffer.data(), buffer.size(), &found);
+  return found == nullptr ? std::nullopt : std::optional<int64_t>(found->pw_uid);
+}
+
+std::optional<int64_t> GroupNumberOf(const std::string& name) {
+  std::vector<char> buffer(kAccountBufferBytes);
+  group record = {};
+  group* found = nullptr;
+  (void)getgrnam_r(name.c_str(), &record, buffer.data(), buffer.size(), &found);
+  return found == nullptr ? std::nullopt : std::optional<int64_t>(found->gr_gid);
 }
 
 }  // namespace ferrox::engine

@@ -26,4 +26,8 @@ std::optional<int32_t> ParseKind(std::string_view text);
 /// The document fields that a friendly name stands for; empty when it is none.
 std::vector<std::string> FriendlyFields(std::string_view name);
 
+/// The number of a user or group of this host; nothing when there is none of that name.
+std::optional<int64_t> UserNumberOf(const std::string& name);
+std::optional<int64_t> GroupNumberOf(const std::string& name);
+
 }  // namespace ferrox::engine

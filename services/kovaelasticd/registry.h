@@ -49,31 +49,34 @@ class Registry {
     bool paused = false;
   };
   std::vector<Listed> List();
-  /// @throws Error kEngineNoSuchIndex.
-  Listed Get(const std::string& id);
 
  private:
   struct Entry {
+    // Guarded by the registry's mutex.
     std::string path;
     bool paused = false;
     Json::Value mappings;
     std::shared_ptr<const Schema> schema;
-    std::shared_ptr<Index> index;  ///< null while it is not open
-    std::string next_id;           ///< while the index moves, where to
+    std::string next_id;  ///< while the index moves, where to
     std::string next_path;
+
+    std::mutex open_mutex;         ///< held while the index is opened, closed or moved; taken before the registry's
+    std::shared_ptr<Index> index;  ///< guarded by open_mutex; null while it is not open
   };
+  using EntryPtr = std::shared_ptr<Entry>;
 
   void Load();
   void Save();
-  Entry& Find(const std::string& id);
-  static void OpenEntry(Entry& entry, bool create);
+  EntryPtr Find(const std::string& id);
+  static void OpenEntry(Entry& entry, const std::string& path, bool create);
   static void CloseEntry(Entry& entry);
   void RefuseTaken(const std::string& id, const std::string& path, const Entry* except);
   void FinishMove(const std::string& id);
 
+  std::mutex change_mutex_;  ///< one change of the registry at a time; taken before all others
   std::mutex mutex_;
   std::string file_path_;
-  std::map<std::string, Entry> entries_;
+  std::map<std::string, EntryPtr> entries_;
 };
 
 }  // namespace ferrox::engine

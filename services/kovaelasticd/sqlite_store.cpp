@@ -73,8 +73,8 @@ SqliteStore::SqliteStore(const std::string& path, bool create, std::shared_ptr<c
   writer_.Execute("PRAGMA cache_size = -8192");
   writer_.Execute("PRAGMA journal_mode = WAL");
   writer_.Execute("PRAGMA synchronous = FULL");
-  writer_.Execute("PRAGMA wal_autocheckpoint = 4000");
-  writer_.Execute("PRAGMA journal_size_limit = 67108864");
+  writer_.Execute("PRAGMA wal_autocheckpoint = 1000");
+  writer_.Execute("PRAGMA journal_size_limit = 8388608");
   RegisterFullText(writer_);
   if (create && writer_.QueryInt("SELECT count(*) FROM sqlite_master") == 0) MakeTables();
   CheckFormat();
