@@ -18,8 +18,8 @@ constexpr char kLostText[] =
 
 }  // namespace
 
-Index::Index(std::unique_ptr<IndexStore> store, std::string marker_path)
-    : store_(std::move(store)), marker_path_(std::move(marker_path)) {
+Index::Index(std::unique_ptr<IndexStore> store, std::string marker_path, std::chrono::milliseconds auto_commit_after)
+    : store_(std::move(store)), marker_path_(std::move(marker_path)), auto_commit_after_(auto_commit_after) {
   lost_ = access(marker_path_.c_str(), F_OK) == 0;
   marked_ = lost_;
   thread_ = std::thread(&Index::ThreadMain, this);
@@ -132,7 +132,7 @@ void Index::RunChange(Task& task) {
     LoseChanges();
     throw;
   }
-  if (uncommitted_++ == 0) auto_commit_at_ = SteadyClock::now() + kAutoCommitAfter;
+  if (uncommitted_++ == 0) auto_commit_at_ = SteadyClock::now() + auto_commit_after_;
 }
 
 void Index::LoseChanges() {

@@ -19,16 +19,17 @@ namespace ferrox::engine {
 /// An open index: its store and the thread that alone changes it. Any number of threads may call any member.
 ///
 /// Changes of several callers share a transaction; a commit that several wait for is made once. What nobody commits is
-/// committed after kAutoCommitAfter or kAutoCommitBytes. When changes that were answered with success are lost (a full
+/// committed after a while, or after kAutoCommitBytes. When changes that were answered with success are lost (a full
 /// disk, or a process that died: a marker file beside the index tells), the next commit fails, so that whoever relies
 /// on it sends them again.
 class Index {
  public:
-  static constexpr std::chrono::seconds kAutoCommitAfter{5};
+  static constexpr std::chrono::milliseconds kAutoCommitAfter{5000};
   static constexpr int64_t kAutoCommitBytes = 64 << 20;
 
   /// `marker_path` is the file that exists while there are uncommitted changes.
-  Index(std::unique_ptr<IndexStore> store, std::string marker_path);
+  Index(std::unique_ptr<IndexStore> store, std::string marker_path,
+        std::chrono::milliseconds auto_commit_after = kAutoCommitAfter);
   Index(const Index&) = delete;
   Index& operator=(const Index&) = delete;
   /// Commits and closes.
@@ -74,6 +75,7 @@ class Index {
   std::shared_mutex store_mutex_;  ///< shared: uses the store; exclusive: closes it
   std::unique_ptr<IndexStore> store_;
   const std::string marker_path_;
+  const std::chrono::milliseconds auto_commit_after_;
 
   std::mutex mutex_;
   std::condition_variable wake_thread_;

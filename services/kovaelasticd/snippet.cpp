@@ -38,21 +38,23 @@ size_t CountDistinct(const std::vector<Match>& matches, size_t first, size_t las
   return static_cast<size_t>(std::count(seen.begin(), seen.end(), true));
 }
 
-/// Finds the words; stops as soon as all of them stand in one window.
+/// Finds the words; stops where a snippet ends that shows all of them.
 std::vector<Match> FindMatches(std::string_view text, const std::vector<SnippetWord>& words) {
   std::vector<Match> matches;
   WordScanner scanner(text.substr(0, kReadMaxBytes));
   size_t window_first = 0;
-  while (scanner.Next()) {
-    if (!matches.empty() && scanner.Begin() > matches.front().begin + kReadBehindBytes) break;
+  size_t read_end = text.size();
+  while (scanner.Next() && scanner.Begin() < read_end) {
     const size_t word = FindWord(words, scanner.Word());
     if (word == words.size()) continue;
+    if (matches.empty()) read_end = scanner.Begin() + kReadBehindBytes;
     matches.push_back({scanner.Begin(), scanner.End(), word});
     while (scanner.End() - matches[window_first].begin > kWindowBytes && window_first + 1 < matches.size()) {
       ++window_first;
     }
     const bool all = CountDistinct(matches, window_first, matches.size() - 1, words.size()) == words.size();
-    if (all || matches.size() >= kMatchesMax) break;
+    if (all) read_end = std::min(read_end, matches[window_first].begin + kSnippetBytes);
+    if (matches.size() >= kMatchesMax) break;
   }
   return matches;
 }

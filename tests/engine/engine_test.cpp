@@ -1,0 +1,240 @@
+#include "services/kovaelasticd/engine.h"
+
+#include <unistd.h>
+
+#include <filesystem>
+#include <memory>
+#include <string>
+
+#include <gtest/gtest.h>
+
+#include "common/error.h"
+#include "common/json_util.h"
+#include "tests/support/temp_dir.h"
+
+namespace ferrox::engine {
+namespace {
+
+class EngineTest : public testing::Test {
+ protected:
+  EngineTest() {
+    std::filesystem::create_directories(folder_ / "state");
+    Restart();
+  }
+  void Restart() {
+    engine_.reset();
+    engine_ = std::make_unique<Engine>(folder_ / "state");
+  }
+  Json::Value SendText(const std::string& request, uid_t uid = 0) {
+    Json::Value reply;
+    EXPECT_TRUE(fromString(reply, engine_->Handle(request, {uid, 0, 0})));
+    return reply;
+  }
+  static Json::Value Request(const std::string& command, const std::string& data) {
+    Json::Value request;
+    request["command"] = command;
+    EXPECT_TRUE(fromString(request["data"], data)) << data;
+    return request;
+  }
+  Json::Value Send(const std::string& command, const std::string& data = "{}") {
+    return SendText(toString(Request(command, data)));
+  }
+  /// The code of the failure, 0 for success.
+  int Code(const std::string& command, const std::string& data) { return CodeOf(Send(command, data)); }
+  static int CodeOf(const Json::Value& reply) {
+    if (reply["success"].asBool()) return 0;
+    EXPECT_GT(reply["error"]["msg"].asString().size(), 15U) << toString(reply);
+    return reply["error"]["code"].asInt();
+  }
+  int Create(const std::string& id, const std::string& name) {
+    return Code("index_create", R"({"id":")" + id + R"(","path":")" + (folder_ / name) + "\"}");
+  }
+  int Put(const std::string& id, const std::string& path, const std::string& text) {
+    return Code("document_upsert_by_id",
+                R"({"id":")" + id + R"(","doc_id":")" + path + R"(","data":{"KOVAMDTextContent":")" + text + "\"}}");
+  }
+  int Commit(const std::string& id) { return Code("commit", R"({"id":")" + id + "\"}"); }
+  int64_t Total(const std::string& query, const std::string& id = "") {
+    const std::string where = id.empty() ? "" : R"(,"id":")" + id + "\"";
+    return Send("search", R"({"query":")" + query + "\"" + where + "}")["data"]["total"].asInt64();
+  }
+
+  test::TempDir folder_;
+  std::unique_ptr<Engine> engine_;
+};
+
+TEST_F(EngineTest, BadRequestsAreAnsweredWithTheirCode) {
+  ASSERT_EQ(Create("a", "a"), 0);
+  const struct {
+    const char* command;
+    const char* data;
+    int code;
+  } kRows[] = {
+      {"no_such_command", "{}", 1402},
+      {"commit", "{}", 1403},
+      {"commit", R"({"id":7})", 1403},
+      {"commit", R"({"id":"none"})", 1404},
+      {"index_stat", R"({"id":"none"})", 1404},
+      {"index_create", R"({"id":"b","path":"relative"})", 1403},
+      {"index_create", R"({"id":"","path":"/x"})", 1403},
+      {"index_create", R"({"id":"b","path":"/x","mappings":{"properties":{"F":{"type":"blob"}}}})", 1403},
+      {"index_create", R"({"id":"a","path":"/elsewhere"})", 1408},
+      {"index_config_set", R"({"id":"a","data":{}})", 1403},
+      {"document_upsert_by_id", R"({"id":"a","doc_id":"x","data":{}})", 1403},
+      {"document_upsert_by_id", R"({"id":"a","doc_id":"/x","data":[]})", 1403},
+      {"document_upsert_by_id", R"({"id":"a","doc_id":"/x","data":{"KOVAMDPath":"/y"}})", 1403},
+      {"document_set_by_id", R"({"id":"a","doc_id":"/x","data":{"KOVAMDPath":"y"}})", 1403},
+      {"document_set_by_id", R"({"id":"a","doc_id":"/x","data":{"KOVAMDTitle":"t"}})", 1405},
+      {"document_get_by_query", R"({"id":"a","query":{"qsl":{"match":{}}}})", 1403},
+      {"document_get_by_query", R"({"id":"a","query":{"qsl":{"prefix":{"KOVAMDPath":"/"}},"load_field":[1]}})", 1403},
+      {"document_del_by_query", R"({"id":"a","query":{"qsl":{"prefix":{"KOVAMDTitle":"/"}}}})", 1403},
+      {"update_term_suggestion", R"({"doc_id_field":"KOVAMDTitle","db_name":"none"})", 1404},
+      {"search", R"({"query":"a","limit":1001})", 1403},
+      {"search", R"({"query":"a","sort":"colour"})", 1403},
+      {"search", R"({"query":"a","offset":-1})", 1403},
+      {"search", R"({"query":"a","ids":["none"]})", 1404},
+      {"search", R"({"query":"(a"})", 1403},
+      {"search", R"({})", 1403},
+      {"document_del_by_id", R"({"id":"a","doc_id":"/never/there"})", 0},
+      {"ping", "{}", 0},
+  };
+  for (const auto& row : kRows) {
+    SCOPED_TRACE(std::string(row.command) + " " + row.data);
+    EXPECT_EQ(Code(row.command, row.data), row.code);
+  }
+  for (const char* text : {"", "[]", "{}", "{\"command\":1}", "{\"compound\":{}}", "{\"compound\":[1]}", "\xFF",
+                           "{\"command\":\"ping\",\"data\":[]}", "{\"compound\":[{\"compound\":[]}]}"}) {
+    SCOPED_TRACE(text);
+    EXPECT_EQ(CodeOf(SendText(text)), 1403);
+  }
+  EXPECT_EQ(CodeOf(SendText(std::string(100000, '['))), 1403);
+}
+
+TEST_F(EngineTest, FieldsMustHaveTheTypeOfTheMappings) {
+  const std::string mappings = R"({"property_id":"KOVAMDPath","default":{"type":"string","_all":true},"properties":
+      {"KOVAMDFSSize":{"type":"int"},"KOVAMDTitle":{"type":"text"},"KOVAMDIsDir":{"type":"bool","_all":false},
+       "Hidden":{"_all":false}}})";
+  ASSERT_EQ(Code("index_create", R"({"id":"m","path":")" + (folder_ / "m") + R"(","mappings":)" + mappings + "}"), 0);
+  const auto put = [this](const std::string& document) {
+    return Code("document_upsert_by_id", R"({"id":"m","doc_id":"/v/x","data":)" + document + "}");
+  };
+  EXPECT_EQ(put(R"({"KOVAMDFSSize":"12"})"), 1403);
+  EXPECT_EQ(put(R"({"KOVAMDTitle":5})"), 1403);
+  EXPECT_EQ(put(R"({"KOVAMDIsDir":"no"})"), 1403);
+  EXPECT_EQ(put(R"({"KOVAMDFSSize":5000000000,"KOVAMDTitle":["a","b"],"Other":{"x":1},"Hidden":"cloak"})"), 0);
+  EXPECT_EQ(Commit("m"), 0);
+  EXPECT_EQ(Total("cloak"), 0);
+  EXPECT_EQ(Total("b size:5000000000"), 1);
+  Restart();  // the mappings last
+  EXPECT_EQ(put(R"({"KOVAMDFSSize":"12"})"), 1403);
+}
+
+TEST_F(EngineTest, OnlyRootAndTheOwnerMayDoMoreThanPing) {
+  EXPECT_EQ(CodeOf(SendText(R"({"command":"ping"})", 54321)), 0);
+  EXPECT_EQ(CodeOf(SendText(R"({"command":"index_list"})", 54321)), 1406);
+  EXPECT_EQ(CodeOf(SendText(R"({"compound":[{"command":"ping"},{"command":"search","data":{"query":"a"}}]})", 54321)),
+            1406);
+  EXPECT_EQ(CodeOf(SendText(R"({"command":"index_list"})", geteuid())), 0);
+}
+
+TEST_F(EngineTest, CompoundsGoOnAfterAFailedPart) {
+  ASSERT_EQ(Create("a", "a"), 0);
+  const Json::Value reply = SendText(R"({"compound":[
+      {"command":"document_upsert_by_id","data":{"id":"a","doc_id":"/v/1","data":{}}},
+      {"command":"document_set_by_id","data":{"id":"a","doc_id":"/v/none","data":{}}},
+      {"command":"document_upsert_by_id","data":{"id":"none","doc_id":"/v/2","data":{}}},
+      {"command":"document_upsert_by_id","data":{"id":"a","doc_id":"/v/3","data":{}}},
+      {"command":"commit","data":{"id":"a"}}]})");
+  EXPECT_TRUE(reply["success"].asBool());
+  EXPECT_TRUE(reply["has_fail"].asBool());
+  std::string codes;
+  for (const Json::Value& part : reply["data"]) codes += std::to_string(CodeOf(part)) + " ";
+  EXPECT_EQ(codes, "0 1405 1404 0 0 ");
+  EXPECT_EQ(Total("path:/v"), 2);
+  const Json::Value empty = SendText(R"({"compound":[]})");
+  EXPECT_TRUE(empty["data"].isArray() && !empty["has_fail"].asBool());
+}
+
+TEST_F(EngineTest, IndicesPauseMoveRenameAndGo) {
+  ASSERT_EQ(Create("a", "a"), 0);
+  EXPECT_EQ(Create("a", "a"), 0) << "the same again";
+  EXPECT_EQ(Create("b", "a"), 1408) << "the folder is taken";
+  ASSERT_EQ(Put("a", "/v/1", "lantern"), 0);
+  EXPECT_EQ(Code("index_pause", R"({"id":"a"})"), 0);
+  EXPECT_EQ(Code("index_pause", R"({"id":"a"})"), 0);
+  EXPECT_EQ(Put("a", "/v/2", "x"), 1409);
+  EXPECT_EQ(Code("search", R"({"id":"a","query":"x"})"), 1409);
+  Restart();
+  EXPECT_EQ(Commit("a"), 1409) << "still paused";
+  EXPECT_EQ(Code("index_resume", R"({"id":"a"})"), 0);
+  EXPECT_EQ(Total("lantern", "a"), 1) << "pausing commits";
+  ASSERT_EQ(Put("a", "/v/3", "lantern"), 0);
+  EXPECT_EQ(Code("index_config_set", R"({"id":"a","data":{"id":"b","path":")" + (folder_ / "deep/b") + "\"}}"), 0);
+  EXPECT_EQ(Commit("a"), 1404);
+  EXPECT_EQ(Total("lantern", "b"), 2);
+  EXPECT_FALSE(std::filesystem::exists(folder_ / "a"));
+  Restart();
+  EXPECT_EQ(Total("lantern"), 2);
+  EXPECT_EQ(Code("index_delete", R"({"id":"b"})"), 0);
+  EXPECT_FALSE(std::filesystem::exists(folder_ / "deep/b"));
+  EXPECT_EQ(Total("lantern"), 0);
+}
+
+TEST_F(EngineTest, ADamagedIndexDoesNotHideTheOthers) {
+  ASSERT_EQ(Create("good", "good"), 0);
+  ASSERT_EQ(Create("bad", "bad"), 0);
+  ASSERT_EQ(Put("good", "/v/1", "lantern"), 0);
+  ASSERT_EQ(Commit("good"), 0);
+  engine_.reset();
+  test::WriteFile(folder_ / "bad/index.sqlite", std::string(100000, 'x'));
+  Restart();
+  const Json::Value reply = Send("search", R"({"id":"bad","query":"lantern"})");
+  EXPECT_EQ(CodeOf(reply), 1407);
+  EXPECT_NE(reply["error"]["msg"].asString().find(folder_ / "bad/index.sqlite"), std::string::npos);
+  EXPECT_EQ(Total("lantern"), 1);
+  EXPECT_TRUE(Send("index_list")["data"][0].isMember("error"));
+  EXPECT_EQ(Code("index_delete", R"({"id":"bad"})"), 0);
+  EXPECT_EQ(Create("bad", "bad"), 0);
+}
+
+TEST_F(EngineTest, LostChangesFailTheNextCommit) {
+  ASSERT_EQ(Create("a", "a"), 0);
+  ASSERT_EQ(Put("a", "/v/1", "lantern"), 0);
+  ASSERT_EQ(Commit("a"), 0);
+  EXPECT_FALSE(std::filesystem::exists(folder_ / "a/uncommitted"));
+  ASSERT_EQ(Put("a", "/v/2", "lantern"), 0);
+  EXPECT_TRUE(std::filesystem::exists(folder_ / "a/uncommitted"));
+  engine_.reset();  // an orderly end commits
+  EXPECT_FALSE(std::filesystem::exists(folder_ / "a/uncommitted"));
+  test::WriteFile(folder_ / "a/uncommitted", "");  // what a killed engine leaves
+  Restart();
+  EXPECT_EQ(Total("lantern"), 2);
+  EXPECT_EQ(Commit("a"), 1407);
+  EXPECT_EQ(Commit("a"), 0) << "said once";
+}
+
+TEST_F(EngineTest, SearchMergesIndicesAndPages) {
+  for (const char* id : {"a", "b"}) {
+    ASSERT_EQ(Create(id, id), 0);
+    for (int i = 0; i < 5; ++i) {
+      ASSERT_EQ(Code("document_upsert_by_id", R"({"id":")" + std::string(id) + R"(","doc_id":"/v/)" + id +
+                                                  std::to_string(i) + R"(","data":{"KOVAMDTextContent":"a lantern",)" +
+                                                  R"("KOVAMDFSContentChangeDate":)" +
+                                                  std::to_string(i * 2 + (*id == 'b' ? 1 : 0)) + "}}"),
+                0);
+    }
+    ASSERT_EQ(Commit(id), 0);
+  }
+  const Json::Value data = Send(
+      "search", R"({"query":"lantern","sort":"date","offset":3,"limit":3,"mark_start":"<","mark_end":">"})")["data"];
+  EXPECT_EQ(data["total"].asInt(), 10);
+  std::string hits;
+  for (const Json::Value& hit : data["hits"]) hits += hit["id"].asString() + ":" + hit["doc_id"].asString() + " ";
+  EXPECT_EQ(hits, "a:/v/a3 b:/v/b2 a:/v/a2 ");
+  EXPECT_EQ(data["hits"][0]["snippet"].asString(), "a <lantern>");
+  EXPECT_FALSE(data["hits"][0]["fields"].isMember("KOVAMDTextContent"));
+  EXPECT_EQ(Send("search", R"({"query":"lantern","ids":["b"],"snippet":false})")["data"]["total"].asInt(), 5);
+}
+
+}  // namespace
+}  // namespace ferrox::engine

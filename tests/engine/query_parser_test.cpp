@@ -1,0 +1,149 @@
+#include <stdlib.h>
+#include <time.h>
+
+#include <string>
+
+#include <gtest/gtest.h>
+
+#include "common/error.h"
+#include "services/kovaelasticd/query.h"
+
+namespace ferrox::engine {
+namespace {
+
+constexpr int64_t kNow = 1718000000;  // 2024-06-10 06:13:20 UTC
+
+class QueryParserTest : public testing::Test {
+ protected:
+  void SetUp() override {
+    (void)setenv("TZ", "UTC", 1);
+    tzset();
+  }
+  static std::string Print(const std::string& text) { return PrintQuery(ParseQuery(text, kNow)); }
+  static std::string Refusal(const std::string& text) {
+    try {
+      return "accepted: " + Print(text);
+    } catch (const Error& error) {
+      EXPECT_EQ(error.Code(), Error::kEngineBadRequest);
+      return error.what();
+    }
+  }
+};
+
+TEST_F(QueryParserTest, Structure) {
+  const struct {
+    const char* text;
+    const char* tree;
+  } kRows[] = {
+      {"fox", "fox"},
+      {"quick fox", "(and quick fox)"},
+      {"quick AND fox", "(and quick fox)"},
+      {"a OR b c", "(or a (and b c))"},
+      {"(a OR b) c", "(and (or a b) c)"},
+      {"-a b", "(and (not a) b)"},
+      {"NOT a", "(not a)"},
+      {"-(a OR b)", "(not (or a b))"},
+      {"a -\"b c\"", "(and a (not \"b c\"))"},
+      {"well-known e-mail", "(and well-known e-mail)"},
+      {"or not and", "(and or not and)"},
+      {"con* \"big hou\"*", "(and con* \"big hou\"*)"},
+      {"a & b - c", "(and a b c)"},
+      {"((a))", "a"},
+      {"name:report title:\"annual report\" name:*.jpg",
+       "(and name:report KOVAMDTitle|KOVAMDHeadline:\"annual report\" "
+       "name:.jpg)"},
+      {"KOVAMDAlbum:x KOVAMDFSName:y content:z", "(and KOVAMDAlbum:x name:y KOVAMDTextContent:z)"},
+      {"kind:image,folder ext:.PDF,txt", "(and kind:35 (or ext:pdf ext:txt))"},
+      {"path:/volume1/photo/ path:\"/a b\"", "(and path:/volume1/photo path:/a b)"},
+      {"owner:1000 owner:root", "(and KOVAMDOwnerUserID:1000 KOVAMDOwnerUserID:0)"},
+      {"\"\" a \"", "!"},
+      {"\"date:7d\"", "\"date:7d\""},
+      {"東京 都", "(and 東京 都)"},
+  };
+  for (const auto& row : kRows) {
+    SCOPED_TRACE(row.text);
+    if (std::string(row.tree) == "!") {
+      EXPECT_NE(Refusal(row.text).find("not closed"), std::string::npos);
+    } else {
+      EXPECT_EQ(Print(row.text), row.tree);
+    }
+  }
+}
+
+TEST_F(QueryParserTest, Ranges) {
+  const std::string low = std::to_string(std::numeric_limits<int64_t>::min());
+  const std::string high = std::to_string(std::numeric_limits<int64_t>::max());
+  const struct {
+    const char* text;
+    std::string printed;
+  } kRows[] = {
+      {"size:700", "size:700..700"},
+      {"size:>10M", "size:10485761.." + high},
+      {"size:>=1kb", "size:1024.." + high},
+      {"size:<2G", "size:" + low + "..2147483647"},
+      {"size:1k..2MiB", "size:1024..2097152"},
+      {"size:..5", "size:" + low + "..5"},
+      {"date:2024", "date:1704067200..1735689599"},
+      {"date:2024-01..2024-06", "date:1704067200..1719791999"},
+      {"date:>2024-01-31", "date:1706745600.." + high},
+      {"date:<=2024-02", "date:" + low + "..1709251199"},
+      {"date:2024-02-29", "date:1709164800..1709251199"},
+      {"date:7d", "date:" + std::to_string(kNow - 7 * 86400) + ".." + high},
+      {"date:2h", "date:" + std::to_string(kNow - 7200) + ".." + high},
+      {"date:today", "date:1717977600..1718063999"},
+      {"date:yesterday", "date:1717891200..1717977599"},
+  };
+  for (const auto& row : kRows) {
+    SCOPED_TRACE(row.text);
+    EXPECT_EQ(Print(row.text), row.printed);
+  }
+}
+
+TEST_F(QueryParserTest, RefusalsNameThePlaceAndTheRemedy) {
+  const struct {
+    std::string text;
+    const char* place;
+    const char* part;
+  } kRows[] = {
+      {"", "character 1:", "nothing to look for"},
+      {"& -", "character 1:", "nothing to look for"},
+      {"a (b", "character 3:", "add a \")\""},
+      {"a) b", "character 2:", "remove it"},
+      {"é \"b", "character 3:", "add a \""},
+      {"a OR", "character 5:", "OR needs"},
+      {"OR a", "character 1:", "OR needs"},
+      {"a OR OR b", "OR needs", "add one"},
+      {"a AND", "character 3:", "AND needs"},
+      {"a NOT", "character 3:", "NOT needs"},
+      {"a foo:b", "character 3:", "put it in quotes"},
+      {"http://x.y", "character 1:", "put it in quotes"},
+      {"name:", "character 1:", "needs a value"},
+      {"size:big", "character 6:", "size:>10M"},
+      {"size:99999999T", "character 6:", "size:>10M"},
+      {"date:2024-13", "character 6:", "date:7d"},
+      {"date:>7d", "character 6:", "date:7d"},
+      {"kind:sound", "character 6:", "known are document"},
+      {"ext:a,,b", "character 5:", "remove it"},
+      {"path:photo", "character 6:", "begin it with /"},
+      {"*port", "character 1:", "name:port"},
+      {"a b*", "character 3:", "two letters"},
+      {"owner:no-such-user-here", "character 7:", "no user"},
+      {"KOVAMDPath:/x", "character 1:", "use path:"},
+      {std::string("a\0b", 3), "character 1:", "NUL"},
+      {std::string(kQueryMaxBytes + 1, 'a'), "character 1:", "shorten it"},
+      {std::string(kQueryMaxDepth + 1, '('), "nested deeper", "simplify"},
+      {"-" + std::string(kQueryMaxDepth, '-') + "a", "nested deeper", "simplify"},
+  };
+  for (const auto& row : kRows) {
+    SCOPED_TRACE(row.text.substr(0, 40));
+    const std::string refusal = Refusal(row.text);
+    EXPECT_NE(refusal.find(row.place), std::string::npos) << refusal;
+    EXPECT_NE(refusal.find(row.part), std::string::npos) << refusal;
+  }
+  std::string many = "w";
+  for (size_t i = 0; i < kQueryMaxTerms; ++i) many += " w";
+  EXPECT_NE(Refusal(many).find("leave some out"), std::string::npos);
+}
+
+}  // namespace
+}  // namespace ferrox::engine

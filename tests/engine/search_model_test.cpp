@@ -1,0 +1,179 @@
+// Random changes and queries: the index and a naive model, which looks at every document, must agree on what is found.
+#include <functional>
+#include <map>
+#include <random>
+#include <set>
+#include <string>
+
+#include <gtest/gtest.h>
+
+#include "services/kovaelasticd/words.h"
+#include "tests/engine/store_helpers.h"
+#include "tests/support/temp_dir.h"
+
+namespace ferrox::engine {
+namespace {
+
+struct ModelDocument {
+  std::string text;
+  int64_t size = 0;
+  int64_t mtime = 0;
+};
+using Model = std::map<std::string, ModelDocument>;
+
+std::vector<std::string> WordsOf(const std::string& text) {
+  std::vector<std::string> words;
+  WordScanner scanner(text);
+  while (scanner.Next()) words.emplace_back(scanner.Word());
+  return words;
+}
+
+bool HasSequence(const std::string& text, const std::vector<std::string>& sequence, bool prefix) {
+  const std::vector<std::string> words = WordsOf(text);
+  for (size_t at = 0; at + sequence.size() <= words.size(); ++at) {
+    bool all = true;
+    for (size_t i = 0; i < sequence.size() && all; ++i) {
+      const bool last = i + 1 == sequence.size();
+      all = words[at + i] == sequence[i] || (prefix && last && words[at + i].rfind(sequence[i], 0) == 0);
+    }
+    if (all) return true;
+  }
+  return false;
+}
+
+/// Whether a document is found, decided condition by condition, without any index.
+bool Matches(const QueryNode& node, const std::string& path, const ModelDocument& document) {
+  const std::string name = path.substr(path.rfind('/') + 1);
+  const auto matches = [&](const QueryNode& child) { return Matches(child, path, document); };
+  switch (node.type) {
+    case QueryNode::Type::kAnd:
+      return std::all_of(node.children.begin(), node.children.end(), matches);
+    case QueryNode::Type::kOr:
+      return std::any_of(node.children.begin(), node.children.end(), matches);
+    case QueryNode::Type::kNot:
+      return !matches(node.children.front());
+    case QueryNode::Type::kExt:
+      return name.substr(name.rfind('.') + 1) == node.text;
+    case QueryNode::Type::kPath:
+      return path.rfind(node.text + "/", 0) == 0 || path == node.text;
+    case QueryNode::Type::kSize:
+      return document.size >= node.low && document.size <= node.high;
+    case QueryNode::Type::kDate:
+      return document.mtime >= node.low && document.mtime <= node.high;
+    default:
+      break;
+  }
+  const QueryWords words = SplitQueryText(node.text, node.prefix);
+  const bool by_part =
+      !node.phrase && FoldText(node.text).size() >= 3 && FoldText(name).find(FoldText(node.text)) != std::string::npos;
+  if (by_part || HasSequence(name, words.words, words.prefix)) return true;
+  return node.type == QueryNode::Type::kText && HasSequence(document.text, words.words, words.prefix);
+}
+
+class SearchModelTest : public testing::Test {
+ protected:
+  size_t Random(size_t below) { return static_cast<size_t>(random_() % below); }
+  std::string Word() {
+    static const char* const kWords[] = {"alpha", "beta", "Betamax", "gam-ma", "delta_x",
+                                         "ép",    "東京", "x",       "omega",  "al"};
+    return kWords[Random(std::size(kWords))];
+  }
+  std::string Path() {
+    static const char* const kEndings[] = {".txt", ".pdf", ".jpg"};
+    return "/v/d" + std::to_string(Random(3)) + "/" + Word() + std::to_string(Random(3)) + kEndings[Random(3)];
+  }
+  std::string Text() {
+    std::string text;
+    for (size_t i = Random(12); i > 0; --i) text += Word() + (Random(6) == 0 ? ". " : " ");
+    return text;
+  }
+  std::string Condition() {
+    switch (Random(9)) {
+      case 0:
+        return "\"" + Word() + " " + Word() + "\"";
+      case 1:
+        return std::string(Random(2) == 0 ? "al" : "bet") + "*";
+      case 2:
+        return "name:" + Word();
+      case 3:
+        return std::string("ext:") + (Random(2) == 0 ? "txt" : "jpg");
+      case 4:
+        return "path:/v/d" + std::to_string(Random(3));
+      case 5:
+        return "size:>" + std::to_string(Random(60));
+      case 6:
+        return "date:20" + std::to_string(20 + Random(4));
+      default:
+        return Word();
+    }
+  }
+  std::string Query() {
+    std::string query;
+    for (size_t i = Random(3) + 1; i > 0; --i) {
+      if (Random(5) == 0) query += "-";
+      query += Random(5) == 0 ? "(" + Condition() + " OR " + Condition() + ") " : Condition() + " ";
+      if (i > 1 && Random(6) == 0) query += "OR ";
+    }
+    return query;
+  }
+
+  void Change() {
+    const std::string path = Path();
+    if (Random(6) == 0) {
+      store_.Delete(path);
+      model_.erase(path);
+    } else if (Random(6) == 0 && model_.count(path) != 0) {
+      Move(path, Path());
+    } else {
+      ModelDocument document{Text(), 0, 1577836800 + static_cast<int64_t>(Random(4 * 365 * 86400))};
+      document.size = static_cast<int64_t>(document.text.size());
+      store_.Upsert(path, FileDocument(path, document.text, document.mtime));
+      model_[path] = document;
+    }
+  }
+  void Move(const std::string& from, const std::string& to) {
+    Json::Value changes = FileDocument(to);
+    for (const char* name : {"KOVAMDFSSize", "KOVAMDFSContentChangeDate"}) changes.removeMember(name);
+    store_.Set(from, changes);
+    const ModelDocument moved = model_[from];
+    model_.erase(from);
+    model_[to] = moved;
+  }
+
+  std::mt19937 random_{20240610};
+  test::TempDir folder_;
+  SqliteStore store_{folder_ / "index.sqlite", true, PlainSchema()};
+  Model model_;
+};
+
+TEST_F(SearchModelTest, EveryQueryFindsWhatTheModelFinds) {
+  size_t found = 0;
+  for (int round = 0; round < 100; ++round) {
+    for (size_t i = Random(20); i > 0; --i) Change();
+    store_.Commit();
+    ASSERT_EQ(store_.Stat().documents, static_cast<int64_t>(model_.size()));
+    for (int i = 0; i < 15; ++i) {
+      const std::string text = Query();
+      SCOPED_TRACE("round " + std::to_string(round) + ": " + text);
+      const QueryNode query = ParseQuery(text, 1718000000);
+      std::string expected;
+      int64_t total = 0;
+      for (const auto& [path, document] : model_) {
+        if (!Matches(query, path, document)) continue;
+        expected += (expected.empty() ? "" : "\n") + path;
+        ++total;
+      }
+      SearchRequest request;
+      request.limit = 1000;
+      request.sort = static_cast<SortKey>(i % 4);
+      const SearchReply reply = Find(store_, text, request);
+      ASSERT_EQ(Paths(reply), expected);
+      ASSERT_EQ(reply.total, total);
+      found += total > 0 ? 1 : 0;
+    }
+  }
+  EXPECT_GT(found, 700U) << "the queries must find something for the comparison to mean anything";
+}
+
+}  // namespace
+}  // namespace ferrox::engine

@@ -1,0 +1,50 @@
+#include "services/kovaelasticd/snippet.h"
+
+#include <string>
+
+#include <gtest/gtest.h>
+
+namespace ferrox::engine {
+namespace {
+
+std::string Snippet(const std::string& text, const std::vector<SnippetWord>& words) {
+  return MakeSnippet(text, words, "[", "]");
+}
+
+TEST(SnippetTest, WordsAreMarkedAsTheyStand) {
+  EXPECT_EQ(Snippet("The Résumé of a café.", {{"resume", false}, {"cafe", false}}), "The [Résumé] of a [café].");
+  EXPECT_EQ(Snippet("reports are reported", {{"report", true}}), "[reports] are [reported]");
+  EXPECT_EQ(Snippet("東京都です", {{"東京", false}, {"京都", false}}), "[東京都]です");
+  EXPECT_EQ(Snippet("nothing of it", {{"else", false}}), "");
+}
+
+TEST(SnippetTest, ControlCharactersAndForeignBytesAreHarmless) {
+  EXPECT_EQ(Snippet("a\x1B[31m\n\t\x01 fox\x07 caf\xE9\x00z", {{"fox", false}}), "a [31m [fox] caf\xEF\xBF\xBD");
+  EXPECT_EQ(Snippet("fox \xE2\x80\xAEgpj.exe \xC2\x9Bx", {{"fox", false}}), "[fox] gpj.exe x");
+}
+
+TEST(SnippetTest, ThePlaceWithTheMostWordsIsShown) {
+  const std::string filler(3000, '.');
+  const std::string text = "apple alone " + filler + " pear alone " + filler + " apple beside pear here " + filler;
+  const std::string snippet = Snippet(text, {{"apple", false}, {"pear", false}});
+  EXPECT_NE(snippet.find("[apple] beside [pear] here"), std::string::npos) << snippet;
+  EXPECT_LT(snippet.size(), 400U);
+  EXPECT_EQ(snippet.rfind("\xE2\x80\xA6"), snippet.size() - 3) << "what is left out is shown";
+}
+
+TEST(SnippetTest, MarksComeInPairsForAnyBytes) {
+  uint32_t state = 99;
+  for (int round = 0; round < 2000; ++round) {
+    std::string text;
+    for (int i = 0; i < 300; ++i) {
+      state = state * 1664525 + 1013904223;
+      text += (state >> 28) == 0 ? std::string(" fox ") : std::string(1, static_cast<char>(state >> 24));
+    }
+    const std::string snippet = MakeSnippet(text, {{"fox", false}}, "\x01", "\x02");
+    EXPECT_EQ(std::count(snippet.begin(), snippet.end(), '\x01'), std::count(snippet.begin(), snippet.end(), '\x02'));
+    for (const char c : snippet) ASSERT_TRUE(static_cast<unsigned char>(c) >= 0x20 || c == '\x01' || c == '\x02');
+  }
+}
+
+}  // namespace
+}  // namespace ferrox::engine

@@ -1,0 +1,117 @@
+#include "services/kovaelasticd/words.h"
+
+#include <string>
+
+#include <gtest/gtest.h>
+
+namespace ferrox::engine {
+namespace {
+
+std::string Words(const std::string& text) {
+  std::string words;
+  WordScanner scanner(text);
+  while (scanner.Next()) words += (words.empty() ? "" : " ") + std::string(scanner.Word());
+  return words;
+}
+
+TEST(WordsTest, TextIsCutAndFolded) {
+  const struct {
+    std::string text;
+    std::string words;
+  } kRows[] = {
+      {"", ""},
+      {" .,-\n", ""},
+      {"Hello, World 42!", "hello world 42"},
+      {"a_b.c-d e's", "a b c d e s"},
+      {"Résumé ÀÉÎÕÜ ñ Ç", "resume aeiou n c"},
+      {"re\xCC\x81sume\xCC\x81", "resume"},  // accents on their own
+      {"Straße Æther Œuvre Łódź Þór", "strasse aether oeuvre lodz thor"},
+      {"ΑΘΗΝΑ Ἀθῆναι Σίσυφος", "αθηνα αθηναι σισυφοσ"},
+      {"МОСКВА Ёлка", "москва елка"},
+      {"İstanbul ISTANBUL ıstanbul", "istanbul istanbul istanbul"},
+      {"Ｆｕｌｌ１２３", "full123"},
+      {"caf\xE9 na\xEFve", "cafe naive"},  // Latin-1
+      {"ab\xFF\xC3", "abya"},              // whatever the bytes are meant to be
+      {"東京都", "東京 京都 都"},
+      {"東", "東"},
+      {"日本 language", "日本 本 language"},
+      {"word東京x", "word 東京 京 x"},
+      {"か\xE3\x82\x99く", "がく く"},                 // a kana and its sound mark
+      {"\xE1\x84\x92\xE1\x85\xA1\xE1\x86\xAB", "한"},  // a syllable in parts
+      {"ภาษา", "ภา าษ ษา า"},
+      {"🎉party", "🎉 party"},
+      {"„quoted“ 10€ a→b", "quoted 10 a b"},
+      {"שָׁלוֹם", "שלום"},
+  };
+  for (const auto& row : kRows) {
+    SCOPED_TRACE(row.text);
+    EXPECT_EQ(Words(row.text), row.words);
+  }
+}
+
+TEST(WordsTest, LongWordsAreCutAtTheirBeginningAlways) {
+  const std::string sixty_four(64, 'x');
+  EXPECT_EQ(Words(std::string(1000, 'X') + " y"), sixty_four + " y");
+  const std::string accents = Words("a" + std::string(40, '\xE9') + "é" + std::string(40, 'b'));
+  EXPECT_EQ(accents.size(), 64U);
+  std::string wide;
+  for (int i = 0; i < 100; ++i) wide += "ж";
+  EXPECT_EQ(Words(wide).size(), 64U) << "never within a character";
+}
+
+TEST(WordsTest, PlacesInTheTextAreThoseOfTheWord) {
+  const std::string text = "x Résumé.東京";
+  WordScanner scanner(text);
+  std::string found;
+  while (scanner.Next()) found += text.substr(scanner.Begin(), scanner.End() - scanner.Begin()) + "|";
+  EXPECT_EQ(found, "x|Résumé|東京|京|");
+}
+
+TEST(WordsTest, QueriesLookForWhatDocumentsHold) {
+  const struct {
+    std::string text;
+    std::string words;
+    bool prefix;
+  } kRows[] = {{"a_b", "a b", false}, {"東京", "東京", false}, {"都", "都", true},
+               {"a東", "a 東", true}, {"東a", "東 a", false},  {"東京 x", "東京 京 x", false}};
+  for (const auto& row : kRows) {
+    SCOPED_TRACE(row.text);
+    const QueryWords words = SplitQueryText(row.text, false);
+    std::string joined;
+    for (const std::string& word : words.words) joined += (joined.empty() ? "" : " ") + word;
+    EXPECT_EQ(joined, row.words);
+    EXPECT_EQ(words.prefix, row.prefix);
+  }
+}
+
+TEST(WordsTest, TrigramsCoverTheFoldedText) {
+  EXPECT_EQ(Trigrams("ab", 10).size(), 0U);
+  EXPECT_EQ(Trigrams("Été.", 10), (std::vector<std::string>{"ete", "te."}));
+  EXPECT_EQ(Trigrams("東京都x", 1), (std::vector<std::string>{"東京都"}));
+}
+
+// Any bytes at all: nothing is read outside the text, every word is short and lies where it says.
+TEST(WordsTest, AnyBytesAreCut) {
+  uint32_t state = 12345;
+  for (int round = 0; round < 3000; ++round) {
+    std::string text;
+    for (size_t i = round % 40; i > 0; --i) {
+      state = state * 1664525 + 1013904223;
+      text += static_cast<char>((state >> 24) | ((state & 0x300) == 0 ? 0xE0 : 0));
+    }
+    WordScanner scanner(text);
+    size_t before = 0;
+    while (scanner.Next()) {
+      ASSERT_FALSE(scanner.Word().empty());
+      ASSERT_LE(scanner.Word().size(), kWordMaxBytes);
+      ASSERT_LE(before, scanner.Begin());
+      ASSERT_LT(scanner.Begin(), scanner.End());
+      ASSERT_LE(scanner.End(), text.size());
+      before = scanner.Begin();
+    }
+    (void)Trigrams(text, 100);
+  }
+}
+
+}  // namespace
+}  // namespace ferrox::engine
