@@ -1,6 +1,5 @@
 #include "fileindex/event_scan.h"
 
-#include <algorithm>
 #include <cstddef>
 #include <cstring>
 
@@ -114,7 +113,7 @@ class Scanner {
       if (HasTextEnd(word)) break;
       at_ += sizeof(word);
     }
-    at_ = std::find_if(at_, end_, IsTextEnd);
+    while (at_ != end_ && !IsTextEnd(*at_)) ++at_;
     if (at_ == end_ || *at_ != '"') return false;
     text = {start, static_cast<size_t>(at_ - start)};
     ++at_;

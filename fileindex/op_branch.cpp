@@ -9,8 +9,6 @@ namespace ferrox::fileindex {
 
 namespace {
 
-constexpr size_t kFewChildren = 8;
-
 struct HashKey {
   uint64_t k0 = 0x0706050403020100u;
   uint64_t k1 = 0x0f0e0d0c0b0a0908u;
@@ -43,7 +41,9 @@ struct SipState {
   }
 };
 
-/// SipHash-1-3 with a key of this process: whoever may name files must not be able to choose names that collide.
+}  // namespace
+
+// SipHash-1-3.
 uint32_t HashName(std::string_view name) {
   static const HashKey key;
   SipState state = {key.k0 ^ 0x736f6d6570736575u, key.k1 ^ 0x646f72616e646f6du, key.k0 ^ 0x6c7967656e657261u,
@@ -66,19 +66,13 @@ uint32_t HashName(std::string_view name) {
   return static_cast<uint32_t>(hash ^ (hash >> 32));
 }
 
-}  // namespace
-
-OPNode* OPBranch::Find(const OPNode& node, std::string_view name) {
-  if (node.children.size() <= kFewChildren) {
-    for (const auto& child : node.children) {
-      if (child->name == name) return child.get();
-    }
-    return nullptr;
+OPNode* OPBranch::Find(const OPNode& node, std::string_view name, uint32_t hash) {
+  if (capacity_ == 0) {
+    const bool is_first = !node.children.empty() && first_hash_ == hash && node.children.front()->name == name;
+    return is_first ? node.children.front().get() : nullptr;
   }
-  if (indexed_ != node.children.size()) Rebuild(node);
-  const uint32_t hash = HashName(name);
-  const size_t mask = slots_.size() - 1;
-  for (size_t at = hash & mask; slots_[at].child != 0; at = (at + 1) & mask) {
+  const uint32_t mask = capacity_ - 1;
+  for (uint32_t at = hash & mask; slots_[at].child != 0; at = (at + 1) & mask) {
     if (slots_[at].hash != hash) continue;
     OPNode* const child = node.children[slots_[at].child - 1].get();
     if (child->name == name) return child;
@@ -86,31 +80,31 @@ OPNode* OPBranch::Find(const OPNode& node, std::string_view name) {
   return nullptr;
 }
 
-void OPBranch::Added(const OPNode& node) {
-  const size_t count = node.children.size();
-  if (count <= kFewChildren) return;
-  if (indexed_ + 1 != count || count * 4 > slots_.size() * 3) {
-    Rebuild(node);
+void OPBranch::Added(const OPNode& node, uint32_t hash) {
+  const auto count = static_cast<uint32_t>(node.children.size());
+  if (count == 1) {
+    first_hash_ = hash;
     return;
   }
-  Put({HashName(node.children.back()->name), static_cast<uint32_t>(count)});
-  indexed_ = count;
+  if (count * 4 > capacity_ * 3) Grow(count);
+  Put({hash, count});
 }
 
-void OPBranch::Rebuild(const OPNode& node) {
-  const size_t count = node.children.size();
-  const std::vector<Slot> old = std::move(slots_);
-  slots_.assign(std::bit_ceil(count * 2), Slot{0, 0});
-  for (const Slot& entry : old) {
-    if (entry.child != 0) Put(entry);
+/// Makes room for twice `count` children; those so far are the ones in the slots, or the first alone.
+void OPBranch::Grow(size_t count) {
+  const std::unique_ptr<Slot[]> old = std::move(slots_);
+  const uint32_t old_capacity = capacity_;
+  capacity_ = static_cast<uint32_t>(std::bit_ceil(count * 2));
+  slots_ = std::make_unique<Slot[]>(capacity_);
+  if (old == nullptr) Put({first_hash_, 1});
+  for (uint32_t i = 0; i < old_capacity; ++i) {
+    if (old[i].child != 0) Put(old[i]);
   }
-  for (size_t i = indexed_; i < count; ++i) Put({HashName(node.children[i]->name), static_cast<uint32_t>(i + 1)});
-  indexed_ = count;
 }
 
 void OPBranch::Put(Slot entry) {
-  const size_t mask = slots_.size() - 1;
-  size_t at = entry.hash & mask;
+  const uint32_t mask = capacity_ - 1;
+  uint32_t at = entry.hash & mask;
   while (slots_[at].child != 0) at = (at + 1) & mask;
   slots_[at] = entry;
 }

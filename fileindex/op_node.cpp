@@ -21,14 +21,15 @@ std::shared_ptr<OPNode> OPNode::GetChild(const std::string& child_name) {
 /// A new child comes from the arena, or from the heap without one.
 OPNode& OPNode::ChildOf(std::string_view child_name, OPArena* arena) {
   if (branch_ == nullptr) branch_ = std::make_unique<OPBranch>();
-  if (OPNode* const found = branch_->Find(*this, child_name)) return *found;
+  const uint32_t hash = HashName(child_name);
+  if (OPNode* const found = branch_->Find(*this, child_name, hash)) return *found;
   std::string text(child_name);
   children.push_back(arena != nullptr
                          ? std::allocate_shared<OPNode>(OPAllocator<OPNode>(arena), shared_from_this(), std::move(text))
                          : newClass<OPNode>(shared_from_this(), std::move(text)));
   OPNode& child = *children.back();
   child.position_ = static_cast<uint32_t>(children.size() - 1);
-  branch_->Added(*this);
+  branch_->Added(*this, hash);
   return child;
 }
 

@@ -22,10 +22,7 @@ namespace {
 constexpr int kDebugLevel = 7;
 constexpr size_t kLoggedTextMaxBytes = 2048;
 
-const Json::Value& NullData() {
-  static const Json::Value null;
-  return null;
-}
+const Json::Value kNullData;
 
 /// The text for a log line: a long one is cut, so that what follows it is not, and a NUL does not end it.
 std::string ForLog(std::string_view text) {
@@ -91,6 +88,10 @@ void OPTree::BreakCycles() noexcept {
   while (node != nullptr) {
     node->ops.clear();
     node->settled_ = 0;
+    if (node->children.size() > 1) {
+      const char* const next = reinterpret_cast<const char*>(node->children[node->children.size() - 2].get());
+      for (size_t line = 0; line < sizeof(OPNode); line += 64) __builtin_prefetch(next + line);
+    }
     if (node->children.empty()) {
       node->branch_.reset();
       node = node->parent;
@@ -124,7 +125,7 @@ void OPTree::BuildTree() {
 void OPTree::InsertLine(std::string_view line) {
   EventFields fields;
   if (line.size() <= kQueueLineMaxBytes && ScanPlainEvent(line, fields)) {
-    Insert(fields, NullData());
+    Insert(fields, kNullData);
   } else {
     InsertEvent(newClass<Event>(std::string(line)));
   }
@@ -149,7 +150,7 @@ void OPTree::Insert(const EventFields& event, const Json::Value& data) {
 std::shared_ptr<OP> OPTree::TakeSpareOP(OPNode& node) {
   if (spare_ == nullptr || spare_.use_count() != 1) {
     spare_ =
-        std::allocate_shared<OP>(OPAllocator<OP>(arena_), node.shared_from_this(), OP_NONE, std::string(), NullData());
+        std::allocate_shared<OP>(OPAllocator<OP>(arena_), node.shared_from_this(), OP_NONE, std::string(), kNullData);
     return spare_;
   }
   if (spare_->node.get() != &node) spare_->node = node.shared_from_this();

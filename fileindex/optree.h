@@ -103,6 +103,7 @@ struct FERROX_EXPORT OPNode : std::enable_shared_from_this<OPNode> {
   bool MayHold(int live_class) const { return (live_ & (1u << live_class)) != 0; }
 
   std::unique_ptr<OPBranch> branch_;  // once there are children
+  OPNode* next_live_[2] = {};         // the next of the parent's children with that bit of live_
   uint32_t position_ = 0;             // among the parent's children
   uint32_t settled_ : 30 = 0;         // as many entries at the front of `ops` are cancelled or renames: no rule applies
   uint32_t live_ : 2 = 0;             // bits: an operation of that class may be pending here or below
@@ -149,7 +150,7 @@ class FERROX_EXPORT OPTree {
  private:
   /// Classes of pending operations by who looks for them below a folder. A node's bit of a class is set whenever it or
   /// a node below it holds such an operation, and perhaps for some time longer; each node with the bit is in its
-  /// parent's list of that class. So a folder's event visits only what may concern it, not the idle nodes beside.
+  /// parent's chain of that class. So a folder's event visits only what may concern it, not the idle nodes beside.
   enum LiveClass : int { kCancellable = 0, kMovable = 1, kEveryNode };
   enum Handler : int;
   struct Step {

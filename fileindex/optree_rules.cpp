@@ -1,6 +1,7 @@
 #define FERROX_SOURCE "optree"
 
 #include <algorithm>
+#include <utility>
 
 #include "common/new_class.h"
 #include "fileindex/event_scan.h"
@@ -150,7 +151,10 @@ void OPTree::Mark(OPNode& node, FileIndexOP op) {
     if (!(live_class == kMovable ? IsMovable(op) : IsCancellable(op))) continue;
     for (OPNode* at = &node; at != nullptr && !at->MayHold(live_class); at = at->parent.get()) {
       at->live_ |= 1u << live_class;
-      if (at->parent != nullptr && at->parent->branch_ != nullptr) at->parent->branch_->live[live_class].push_back(at);
+      if (at->parent == nullptr || at->parent->branch_ == nullptr) continue;
+      OPNode*& first_live = at->parent->branch_->first_live[live_class];
+      at->next_live_[live_class] = first_live;
+      first_live = at;
     }
   }
 }
@@ -169,10 +173,16 @@ std::vector<OPNode*> OPTree::NodesBelow(OPNode& top, LiveClass live_class) {
       for (const auto& child : node->children) open.push_back(child.get());
       continue;
     }
-    std::vector<OPNode*>& live = node->branch_->live[live_class];
+    const auto found = static_cast<std::ptrdiff_t>(open.size());
+    for (OPNode* at = node->branch_->first_live[live_class]; at != nullptr; at = at->next_live_[live_class]) {
+      open.push_back(at);
+    }
+    // The chain is newest first, which is often the reverse of what is wanted.
+    std::reverse(open.begin() + found, open.end());
     const auto by_position = [](const OPNode* a, const OPNode* b) { return a->position_ < b->position_; };
-    if (!std::is_sorted(live.begin(), live.end(), by_position)) std::sort(live.begin(), live.end(), by_position);
-    open.insert(open.end(), live.begin(), live.end());
+    if (!std::is_sorted(open.begin() + found, open.end(), by_position)) {
+      std::sort(open.begin() + found, open.end(), by_position);
+    }
   }
   // Every node came before those below it and the last sibling first.
   std::reverse(nodes.begin(), nodes.end());
@@ -184,11 +194,17 @@ std::vector<OPNode*> OPTree::NodesBelow(OPNode& top, LiveClass live_class) {
 void OPTree::Unmark(OPNode& top, const std::vector<OPNode*>& below, LiveClass live_class) {
   const auto drop_idle_children = [live_class](OPNode& node) {
     if (node.branch_ == nullptr) return false;
-    std::vector<OPNode*>& live = node.branch_->live[live_class];
-    live.erase(std::remove_if(live.begin(), live.end(),
-                              [live_class](const OPNode* child) { return !child->MayHold(live_class); }),
-               live.end());
-    return !live.empty();
+    OPNode** link = &node.branch_->first_live[live_class];
+    while (*link != nullptr) {
+      OPNode* const child = *link;
+      OPNode*& next = child->next_live_[live_class];
+      if (child->MayHold(live_class)) {
+        link = &next;
+      } else {
+        *link = std::exchange(next, nullptr);
+      }
+    }
+    return node.branch_->first_live[live_class] != nullptr;
   };
   const auto holds = [live_class](const std::shared_ptr<OP>& op) {
     return live_class == kMovable ? IsMovable(op->op) : IsCancellable(op->op);

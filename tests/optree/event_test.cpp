@@ -5,7 +5,7 @@
 
 #include "common/error.h"
 #include "common/json_util.h"
-#include "tests/support/event_reference.h"
+#include "fuzz/event_reference.h"
 #include "tests/support/log_capture.h"
 #include "tests/support/queue_lines.h"
 

@@ -1,11 +1,10 @@
-#include "tests/support/optree_model.h"
-
 #include <random>
 
 #include <gtest/gtest.h>
 
 #include "common/error.h"
 #include "common/new_class.h"
+#include "fuzz/queue_model.h"
 #include "tests/support/queue_lines.h"
 #include "tests/support/temp_dir.h"
 

@@ -42,6 +42,7 @@ class ListModel {
   }
 
   bool crashed = false;
+  size_t walked = 0;  // nodes that renames passed so far
 
  private:
   struct Node {
@@ -176,6 +177,7 @@ class ListModel {
   }
 
   void MoveAlong(int node, const std::string& from, const std::string& to) {
+    ++walked;
     const int target = GetNode(to + nodes_[node].path.substr(from.size()));
     const std::vector<int> copy = nodes_[node].ops;
     for (const int op : copy) {

@@ -26,7 +26,7 @@ inline std::string Outcome(const std::string& line) {
   }
 }
 
-/// The same, for lines without NUL and of lawful length.
+/// The same by the JSON library.
 inline std::string ReferenceOutcome(const std::string& line) {
   uint32_t event = 0;
   bool is_dir = false;
@@ -34,7 +34,9 @@ inline std::string ReferenceOutcome(const std::string& line) {
   std::string path_old;
   Json::Value data;
   Json::Value members;
-  if (!fromString(members, line)) return ErrorText(Error(Error::kMalformedEvent, "Malformed event_raw: " + line));
+  const bool has_nul = line.find('\0') != std::string::npos;
+  if (line.size() > fileindex::kQueueLineMaxBytes || has_nul || !fromString(members, line))
+    return ErrorText(Error(Error::kMalformedEvent, "Malformed event_raw: " + line));
   try {
     GetJsonValue(event, members, "event", true);
     GetJsonValue(is_dir, members, "is_dir", false);
