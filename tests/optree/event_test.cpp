@@ -15,14 +15,6 @@ namespace {
 
 using fileindex::Event;
 
-TEST(EventTest, PlainLine) {
-  const Event event(R"({"event":64,"is_dir":true,"path":"/v/s/a","path_old":"","data":null})");
-  EXPECT_EQ(event.event, 64u);
-  EXPECT_TRUE(event.is_dir);
-  EXPECT_EQ(event.path, "/v/s/a");
-  EXPECT_TRUE(event.data.isNull());
-}
-
 TEST(EventTest, ReadsAsTheJsonLibraryDoes) {
   const char* const lines[] = {
       R"({"event":64,"path":"/a"})",

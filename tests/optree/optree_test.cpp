@@ -4,6 +4,7 @@
 
 #include "common/error.h"
 #include "common/new_class.h"
+#include "fileindex/util.h"
 #include "tests/support/log_capture.h"
 #include "tests/support/queue_lines.h"
 #include "tests/support/temp_dir.h"
@@ -14,10 +15,12 @@ namespace {
 
 using namespace fileindex;
 
-/// The operations that the lines come to, one a line.
+/// The operations that the lines, the last one without its newline, come to, one a line.
 std::string Fold(const std::vector<std::string>& lines) {
   const TempDir dir;
-  WriteQueue(dir / "queue", lines);
+  std::string queue;
+  for (const std::string& line : lines) queue += (queue.empty() ? "" : "\n") + line;
+  WriteFile(dir / "queue", queue);
   OPTree tree(dir / "queue");
   std::ostringstream text;
   tree.ProcessOP([&text](std::shared_ptr<OP> op) { text << op << "\n"; });
@@ -73,12 +76,6 @@ TEST(OPTreeTest, BadLinesAreLoggedAndSkipped) {
   EXPECT_FALSE(LogCapture::Contains("[err:"));
 }
 
-TEST(OPTreeTest, LastLineNeedsNoNewline) {
-  const TempDir dir;
-  WriteFile(dir / "queue", Create("/v/a") + "\n" + Create("/v/b"));
-  EXPECT_EQ(OPTree(dir / "queue").ProcessOP([](std::shared_ptr<OP>) {}), 2);
-}
-
 TEST(OPTreeTest, NothingCountsBesideACrash) {
   const LogCapture log;
   EXPECT_EQ(Fold({Create("/v/a"), Crash("/v"), Create("/v/b")}), "[07] \n");
@@ -95,6 +92,16 @@ TEST(OPTreeTest, MissingQueue) {
     EXPECT_STREQ(error.what(), "Failed to open queue, reason=No such file or directory");
   }
   EXPECT_TRUE(LogCapture::Contains(" (BuildTree) Failed [!input_stream], reason: Failed to open queue"));
+}
+
+TEST(OPTreeTest, LinesAreLoggedAtTheDebugLevelOnly) {
+  const LogCapture log;
+  Fold({Create("/v/a")});
+  EXPECT_TRUE(LogCapture::Lines().empty());
+  log_level = 7;
+  Fold({Create("/v/a")});
+  log_level = 0;
+  EXPECT_TRUE(LogCapture::Contains(" Got event: {\"data\":null,\"event\":64"));
 }
 
 class OPTreeNodesTest : public testing::Test {
