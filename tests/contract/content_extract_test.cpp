@@ -157,6 +157,7 @@ TEST_F(ContentExtractTest, Html) {
       {"&eacute;&#233;&#xE9;&nbsp;&bogus; &amp;lt; AT&T &#x110000; &#150;",
        "\u00e9\u00e9\u00e9 &bogus; &lt; AT&T \uFFFD \u2013", ""},
       {"<!-- hidden <p> -->seen<!-- open", "seen", ""},
+      {"a\u00a0\u00a0b &nbsp; c\u00a9d", "a b c\u00a9d", ""},
       {"1 < 2 && 3 > 2", "1 < 2 && 3 > 2", ""},
       {"<p>unclosed <b attr=\"quote>text", "unclosed text", ""},
       {"<td>a</td><td>b</td><br>c", "a b\nc", ""},

@@ -22,6 +22,12 @@ char Lower(char c) { return c >= 'A' && c <= 'Z' ? static_cast<char>(c - 'A' + '
 
 bool IsBlank(char c) { return c == ' ' || c == '\t' || c == '\n' || c == '\r' || c == '\f'; }
 
+/// The bytes of the blank at `at`, a no-break space among them; 0 when there is none.
+size_t BlankLength(std::string_view text, size_t at) {
+  if (IsBlank(text[at])) return 1;
+  return text[at] == '\xC2' && at + 1 < text.size() && text[at + 1] == '\xA0' ? 2 : 0;
+}
+
 bool IsLetter(char c) { return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z'); }
 
 bool IsNameByte(char c) {
@@ -61,16 +67,18 @@ class TextSink {
   explicit TextSink(size_t limit_bytes) : limit_bytes_(limit_bytes) {}
 
   void Add(std::string_view piece) {
-    while (!piece.empty()) {
-      const auto end = std::find_if(piece.begin(), piece.end(), &IsBlank);
-      const auto length = static_cast<size_t>(end - piece.begin());
-      if (length > 0) AddWord(piece.substr(0, length));
-      piece.remove_prefix(length);
-      while (!piece.empty() && IsBlank(piece.front())) {
-        Separate(piece.front() == '\n' ? '\n' : ' ');
-        piece.remove_prefix(1);
+    size_t word_at = 0;
+    for (size_t at = 0; at < piece.size();) {
+      const size_t blank = BlankLength(piece, at);
+      if (blank == 0) {
+        ++at;
+        continue;
       }
+      if (at > word_at) AddWord(piece.substr(word_at, at - word_at));
+      Separate(piece[at] == '\n' ? '\n' : ' ');
+      word_at = at += blank;
     }
+    if (piece.size() > word_at) AddWord(piece.substr(word_at));
   }
 
   /// What stands between the text so far and what follows; a line end wins over a blank.
