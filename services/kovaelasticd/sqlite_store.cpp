@@ -21,9 +21,9 @@ constexpr size_t kIdleReadersMax = 4;
 constexpr const char* kTables[] = {
     "CREATE TABLE info(key TEXT PRIMARY KEY, value INTEGER NOT NULL) WITHOUT ROWID",
     "CREATE TABLE fields(number INTEGER PRIMARY KEY, name TEXT NOT NULL UNIQUE)",
-    "CREATE TABLE docs(id INTEGER PRIMARY KEY, path TEXT NOT NULL, name TEXT NOT NULL COLLATE NOCASE,"
-    " ext TEXT NOT NULL, kind INTEGER NOT NULL, size INTEGER, mtime INTEGER, text_bytes INTEGER NOT NULL,"
-    " derived INTEGER NOT NULL, error TEXT, packed BLOB NOT NULL)",
+    ("CREATE TABLE docs(id INTEGER PRIMARY KEY, path TEXT NOT NULL, name TEXT NOT NULL COLLATE NOCASE,"
+     " ext TEXT NOT NULL, kind INTEGER NOT NULL, size INTEGER, mtime INTEGER, text_bytes INTEGER NOT NULL,"
+     " derived INTEGER NOT NULL, error TEXT, packed BLOB NOT NULL)"),
     "CREATE UNIQUE INDEX docs_path ON docs(path)",
     "CREATE INDEX docs_name ON docs(name)",
     "CREATE INDEX docs_kind ON docs(kind, ext)",
@@ -32,8 +32,8 @@ constexpr const char* kTables[] = {
     "CREATE INDEX docs_error ON docs(error) WHERE error IS NOT NULL",
     "CREATE TABLE bodies(id INTEGER PRIMARY KEY, zstd BLOB NOT NULL)",
     "CREATE VIRTUAL TABLE content_fts USING fts5(body, content='', columnsize=0, tokenize='kova')",
-    "CREATE VIRTUAL TABLE meta_fts USING fts5(grams, name, title, text, fields, content='', columnsize=0,"
-    " tokenize='kova')",
+    ("CREATE VIRTUAL TABLE meta_fts USING fts5(grams, name, title, text, fields, content='', columnsize=0,"
+     " tokenize='kova')"),
     "CREATE TABLE suggestions(word TEXT PRIMARY KEY, documents INTEGER NOT NULL) WITHOUT ROWID",
     // Words are gathered in so much memory, in bytes, before they are written as one piece.
     "INSERT INTO content_fts(content_fts, rank) VALUES('hashsize', 8388608)",
