@@ -23,7 +23,7 @@ const Json::Value& MemberOf(const Json::Value& object, const char* key) {
 
 std::string Count(uint64_t number) {
   std::string text = std::to_string(number);
-  for (size_t at = text.size(); at > 3; at -= 3) text.insert(at - 3, ",");
+  for (size_t at = text.size(); at > 3; at -= 3) text.insert(at - 3, 1, ',');
   return text;
 }
 
