@@ -97,8 +97,10 @@ void OPTree::MoveAlong(OPNode& node, const std::string& old_path, const std::str
 }
 
 void OPTree::Take(OPNode& to, const std::vector<std::shared_ptr<OP>>& moved) {
+  if (moved.empty()) return;
+  const std::shared_ptr<OPNode> node = to.shared_from_this();
   for (const auto& op : moved) {
-    op->node = to.shared_from_this();
+    op->node = node;
     to.ops.push_back(op);
     Mark(to, op->op);
   }
