@@ -6,8 +6,6 @@ namespace ferrox::engine {
 
 namespace {
 
-constexpr int kBusyTimeoutMs = 10000;
-
 std::string Remedy(int result) {
   switch (result & 0xFF) {
     case SQLITE_FULL:

@@ -52,6 +52,7 @@ class Statement {
 class Database {
  public:
   enum class Mode { kCreate, kWrite, kRead };
+  static constexpr int kBusyTimeoutMs = 10000;
 
   /// @throws Error kEngineStorage with the file's name, the cause and the remedy, as every member does.
   Database(const std::string& path, Mode mode);

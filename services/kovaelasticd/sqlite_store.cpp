@@ -17,6 +17,7 @@ namespace {
 constexpr int64_t kApplicationId = 0x4B4F5641;
 constexpr int64_t kFormatVersion = 1;
 constexpr size_t kIdleReadersMax = 4;
+constexpr int64_t kLogMaxBytes = 16 << 20;
 
 constexpr const char* kTables[] = {
     "CREATE TABLE info(key TEXT PRIMARY KEY, value INTEGER NOT NULL) WITHOUT ROWID",
@@ -118,6 +119,17 @@ void SqliteStore::Commit() {
   writer_.Execute("COMMIT");
   in_transaction_ = false;
   uncommitted_bytes_ = 0;
+  ShortenLog();
+}
+
+/// After a large transaction, moves the write-ahead log into the database and cuts it, unless somebody reads it just
+/// now.
+void SqliteStore::ShortenLog() {
+  if (BytesOnDisk(writer_.Path() + "-wal") < kLogMaxBytes) return;
+  (void)sqlite3_busy_timeout(writer_.Handle(), 0);
+  // What fails here is tried again with the next transaction.
+  (void)sqlite3_wal_checkpoint_v2(writer_.Handle(), nullptr, SQLITE_CHECKPOINT_TRUNCATE, nullptr, nullptr);
+  (void)sqlite3_busy_timeout(writer_.Handle(), Database::kBusyTimeoutMs);
 }
 
 void SqliteStore::Rollback() {

@@ -58,6 +58,7 @@ class SqliteStore : public IndexStore {
   void MakeTables();
   void CheckFormat();
   void Begin();
+  void ShortenLog();
   void AddFieldNames(const Json::Value& document);
 
   Pending& Touch(const StoredDocument& stored);

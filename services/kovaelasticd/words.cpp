@@ -1,23 +1,27 @@
 #include "services/kovaelasticd/words.h"
 
-#include <array>
+#include <algorithm>
+#include <cstddef>
 
 namespace ferrox::engine {
 
 namespace {
 
-/// The folded form of each ASCII letter and digit, 0 for what separates words.
-constexpr std::array<char, 128> kAsciiFold = [] {
-  std::array<char, 128> table{};
-  for (char c = '0'; c <= '9'; ++c) table[static_cast<size_t>(c)] = c;
-  for (char c = 'a'; c <= 'z'; ++c) {
-    table[static_cast<size_t>(c)] = c;
+/// What a byte is worth: the folded form of an ASCII letter or digit, or one of these.
+constexpr unsigned char kSeparatorByte = 0;
+constexpr unsigned char kWideByte = 1;  ///< part of a character of several bytes
+constexpr std::array<unsigned char, 256> kByteFold = [] {
+  std::array<unsigned char, 256> table{};
+  for (size_t c = 0x80; c < 0x100; ++c) table[c] = kWideByte;
+  for (unsigned char c = '0'; c <= '9'; ++c) table[c] = c;
+  for (unsigned char c = 'a'; c <= 'z'; ++c) {
+    table[c] = c;
     table[static_cast<size_t>(c - 'a' + 'A')] = c;
   }
   return table;
 }();
 
-bool IsAscii(char c) { return static_cast<unsigned char>(c) < 0x80; }
+unsigned char FoldByte(char byte) { return kByteFold[static_cast<unsigned char>(byte)]; }
 
 }  // namespace
 
@@ -28,16 +32,20 @@ bool WordScanner::Emit(Kind kind, size_t begin, size_t end) {
   return true;
 }
 
-void WordScanner::AppendToWord() {
-  if (word_.size() + piece_.size() <= kWordMaxBytes) word_ += piece_;
+/// Adds to the word, as long as it does not become too long.
+void WordScanner::Append(std::string_view folded) {
+  if (word_size_ + folded.size() > kWordMaxBytes) return;
+  std::copy(folded.begin(), folded.end(), word_.begin() + static_cast<ptrdiff_t>(word_size_));
+  word_size_ += folded.size();
 }
 
 bool WordScanner::Next() {
-  word_.clear();
+  word_size_ = 0;
   while (pos_ < text_.size()) {
     if (previous_.empty()) {
-      while (pos_ < text_.size() && IsAscii(text_[pos_]) && kAsciiFold[static_cast<size_t>(text_[pos_])] == 0) ++pos_;
+      while (pos_ < text_.size() && FoldByte(text_[pos_]) == kSeparatorByte) ++pos_;
       if (pos_ >= text_.size()) return false;
+      if (FoldByte(text_[pos_]) != kWideByte) return NextPlainWord();
     }
     const CodePoint c = DecodeAt(text_, pos_);
     piece_.clear();
@@ -55,7 +63,7 @@ bool WordScanner::Next() {
     pos_ += c.length_bytes;
   }
   if (previous_.empty()) return false;
-  word_.swap(previous_);
+  Append(previous_);
   previous_.clear();
   return Emit(Kind::kRunEnd, previous_begin_, previous_end_);
 }
@@ -66,7 +74,8 @@ bool WordScanner::NextPair(const CodePoint& c) {
   pos_ += c.length_bytes;
   const bool complete = !previous_.empty();
   if (complete) {
-    word_ = previous_ + piece_;
+    Append(previous_);
+    Append(piece_);
     (void)Emit(Kind::kPair, previous_begin_, pos_);
   }
   previous_ = piece_;
@@ -78,20 +87,18 @@ bool WordScanner::NextPair(const CodePoint& c) {
 bool WordScanner::NextPlainWord() {
   const size_t begin = pos_;
   size_t end = pos_;
-  while (pos_ < text_.size()) {
-    const char byte = text_[pos_];
-    if (IsAscii(byte)) {
-      const char folded = kAsciiFold[static_cast<size_t>(byte)];
-      if (folded == 0) break;
-      if (word_.size() < kWordMaxBytes) word_ += folded;
+  for (;;) {
+    unsigned char folded = kSeparatorByte;
+    while (pos_ < text_.size() && (folded = FoldByte(text_[pos_])) > kWideByte) {
+      if (word_size_ < kWordMaxBytes) word_[word_size_++] = static_cast<char>(folded);
       end = ++pos_;
-      continue;
     }
+    if (pos_ >= text_.size() || folded == kSeparatorByte) break;
     const CodePoint c = DecodeAt(text_, pos_);
     piece_.clear();
     const CharClass char_class = FoldTo(piece_, c.value);
     if (char_class == CharClass::kSeparator || char_class == CharClass::kPaired) break;
-    AppendToWord();
+    Append(piece_);
     pos_ += c.length_bytes;
     end = pos_;
   }

@@ -1,5 +1,6 @@
 #pragma once
 
+#include <array>
 #include <cstdint>
 #include <string>
 #include <string_view>
@@ -25,7 +26,7 @@ class WordScanner {
   /// Goes to the next word; false at the end.
   bool Next();
   /// The present word, folded; valid until the next call of Next.
-  std::string_view Word() const { return word_; }
+  std::string_view Word() const { return {word_.data(), word_size_}; }
   Kind WordKind() const { return kind_; }
   /// Where it stands in the text, in bytes.
   size_t Begin() const { return begin_; }
@@ -35,11 +36,12 @@ class WordScanner {
   bool Emit(Kind kind, size_t begin, size_t end);
   bool NextPair(const CodePoint& c);
   bool NextPlainWord();
-  void AppendToWord();
+  void Append(std::string_view folded);
 
   std::string_view text_;
   size_t pos_ = 0;
-  std::string word_;
+  std::array<char, kWordMaxBytes> word_;
+  size_t word_size_ = 0;
   std::string piece_;     ///< the folded character at hand
   std::string previous_;  ///< the folded character that waits for its second half
   size_t previous_begin_ = 0;
