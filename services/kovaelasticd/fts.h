@@ -21,7 +21,7 @@ struct WordHit {
   uint8_t count;   ///< how often it stands in the content, at most kCountMax
   uint8_t places;  ///< a set of HitPlace
 };
-constexpr uint8_t kCountMax = 60;
+constexpr uint8_t kCountMax = 32;
 
 /// Collects the documents that a full-text expression finds: all of them in a set, and the newest-added `hits_max` of
 /// them one by one.

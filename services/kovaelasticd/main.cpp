@@ -1,3 +1,5 @@
+#include <malloc.h>
+
 #include <cstdio>
 #include <cstring>
 
@@ -13,6 +15,13 @@ constexpr char kHelp[] =
     "usage: kovaelasticd [--help | --version]\n"
     "Keeps the search indices and answers requests on its socket, in the foreground, until SIGTERM or SIGINT.\n"
     "FERROX_ROOT chooses the instance: a folder before every path of the product.\n";
+
+/// Searches need a few MiB for a moment: without this, every one would ask the kernel for them and give them back.
+void KeepMemoryForSearches() {
+  (void)mallopt(M_ARENA_MAX, 4);
+  (void)mallopt(M_MMAP_THRESHOLD, 8 << 20);
+  (void)mallopt(M_TRIM_THRESHOLD, 16 << 20);
+}
 
 void Serve() {
   using namespace ferrox;
@@ -44,6 +53,7 @@ int main(int argc, char** argv) {
   if (argc == 2 && strcmp(argv[1], "--version") == 0) return printf("kovaelasticd %s\n", ferrox::engine::kVersion) < 0;
   if (argc != 1) return fputs(kHelp, stderr) < 0 ? 3 : 2;
   try {
+    KeepMemoryForSearches();
     Serve();
     return 0;
   } catch (const std::exception& error) {

@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <cmath>
+#include <numeric>
 
 #include "common/clock.h"
 #include "fileindex/util.h"
@@ -245,11 +246,11 @@ DocSet Searcher::EvaluateWords(const QueryNode& node, bool ranking) {
 }
 
 /// The documents worth ranking: all, or the newest added of them.
-std::vector<int64_t> Searcher::RankedCandidates(const DocSet& documents, int64_t total, bool& bounded) {
-  std::vector<int64_t> ids;
+std::vector<Searcher::Candidate> Searcher::Candidates(const DocSet& documents, int64_t total, bool& bounded) {
+  std::vector<Candidate> candidates;
   const int64_t skip = std::max<int64_t>(0, total - static_cast<int64_t>(kRankedMax));
   bounded = skip > 0;
-  ids.reserve(static_cast<size_t>(total - skip));
+  candidates.reserve(static_cast<size_t>(total - skip));
   DocSet by_name;
   if (bounded) {
     for (const Term& term : terms_) {
@@ -258,10 +259,10 @@ std::vector<int64_t> Searcher::RankedCandidates(const DocSet& documents, int64_t
   }
   int64_t place = 0;
   documents.ForEach([&](int64_t id) {
-    if (place++ >= skip || by_name.Contains(id)) ids.push_back(id);
+    if (place++ >= skip || by_name.Contains(id)) candidates.push_back({id, 0, 0});
     return true;
   });
-  return ids;
+  return candidates;
 }
 
 /// How long the document's text is compared with others; `freshness` becomes the share of the score for its age.
@@ -277,7 +278,8 @@ double Searcher::LengthFactor(int64_t id, double& freshness) {
 
 /// Finds the hits of a word among candidates in the order of their numbers; calls `take` with the place and the hit.
 template <typename Take>
-void Searcher::ForEachCandidateHit(const std::vector<Ranked>& candidates, const std::vector<WordHit>& hits, Take take) {
+void Searcher::ForEachCandidateHit(const std::vector<Candidate>& candidates, const std::vector<WordHit>& hits,
+                                   Take take) {
   size_t place = 0;
   int64_t before = 0;
   for (const WordHit& hit : hits) {
@@ -288,43 +290,56 @@ void Searcher::ForEachCandidateHit(const std::vector<Ranked>& candidates, const 
   }
 }
 
-/// Scores all candidates by the words' hits alone and keeps the `top` best; these are scored again with length and age.
-void Searcher::AddScores(std::vector<Ranked>& candidates, size_t top) {
-  std::vector<uint8_t> counts(candidates.size() * terms_.size());
+/// Scores all candidates by the words' hits alone; `counts` becomes the words' occurrences, candidate by candidate.
+void Searcher::ScoreAtFirstSight(std::vector<Candidate>& candidates, std::vector<uint8_t>& counts) {
+  counts.assign(candidates.size() * terms_.size(), 0);
   for (size_t t = 0; t < terms_.size(); ++t) {
     const double weight = terms_[t].weight;
     ForEachCandidateHit(candidates, terms_[t].content, [&](size_t place, const WordHit& hit) {
       counts[place * terms_.size() + t] = hit.count;
-      candidates[place].score += weight * CountValue(hit.count, 1);
+      candidates[place].score += static_cast<float>(weight * CountValue(hit.count, 1));
     });
     ForEachCandidateHit(candidates, terms_[t].meta, [&](size_t place, const WordHit& hit) {
-      candidates[place].place_score += weight * PlaceValue(hit.places);
+      const auto value = static_cast<float>(weight * PlaceValue(hit.places));
+      candidates[place].score += value;
+      candidates[place].place_score += value;
     });
-  }
-  for (size_t place = 0; place < candidates.size(); ++place) {
-    candidates[place].first_counts = place * terms_.size();
-    candidates[place].score += candidates[place].place_score;
-  }
-  top = std::min(top, candidates.size());
-  const auto end = candidates.begin() + static_cast<ptrdiff_t>(top);
-  std::partial_sort(candidates.begin(), end, candidates.end(), [](const Ranked& a, const Ranked& b) {
-    return a.score != b.score ? a.score > b.score : a.id > b.id;
-  });
-  candidates.erase(end, candidates.end());
-  for (Ranked& ranked : candidates) {
-    const double length = LengthFactor(ranked.id, ranked.score);
-    ranked.score += ranked.place_score;
-    for (size_t t = 0; t < terms_.size(); ++t) {
-      const uint8_t count = counts[ranked.first_counts + t];
-      if (count > 0) ranked.score += terms_[t].weight * CountValue(count, length);
-    }
   }
 }
 
+/// The places of the `top` best candidates, in no order; of equal ones those added last.
+std::vector<size_t> Searcher::BestPlaces(const std::vector<Candidate>& candidates, size_t top) {
+  std::vector<size_t> places(candidates.size());
+  std::iota(places.begin(), places.end(), size_t{0});
+  if (top >= places.size()) return places;
+  std::nth_element(places.begin(), places.begin() + static_cast<ptrdiff_t>(top), places.end(), [&](size_t a, size_t b) {
+    return candidates[a].score != candidates[b].score ? candidates[a].score > candidates[b].score : a > b;
+  });
+  places.resize(top);
+  return places;
+}
+
+/// The score with the length of the text and its age.
+double Searcher::CloseScore(const Candidate& candidate, const uint8_t* counts) {
+  double score = 0;
+  const double length = LengthFactor(candidate.id, score);
+  score += static_cast<double>(candidate.place_score);
+  for (size_t t = 0; t < terms_.size(); ++t) {
+    if (counts[t] > 0) score += terms_[t].weight * CountValue(counts[t], length);
+  }
+  return score;
+}
+
 std::vector<Searcher::Ranked> Searcher::RankByRelevance(const DocSet& documents, int64_t total, bool& bounded) {
+  std::vector<Candidate> candidates = Candidates(documents, total, bounded);
+  std::vector<uint8_t> counts;
+  ScoreAtFirstSight(candidates, counts);
   std::vector<Ranked> ranked;
-  for (const int64_t id : RankedCandidates(documents, total, bounded)) ranked.push_back(Ranked{id});
-  AddScores(ranked, std::max(Needed(), kRankedCloselyMin));
+  for (const size_t place : BestPlaces(candidates, std::max(Needed(), kRankedCloselyMin))) {
+    Ranked entry(candidates[place].id);
+    entry.score = CloseScore(candidates[place], counts.data() + place * terms_.size());
+    ranked.push_back(std::move(entry));
+  }
   const bool ascending = request_.ascending;
   std::sort(ranked.begin(), ranked.end(), [ascending](const Ranked& a, const Ranked& b) {
     if (a.score != b.score) return ascending ? a.score < b.score : a.score > b.score;

@@ -24,13 +24,18 @@ class Searcher {
     std::vector<WordHit> content;
     std::vector<WordHit> meta;
   };
+  /// A document that may be among the best.
+  struct Candidate {
+    int64_t id;
+    float score;        ///< at first sight
+    float place_score;  ///< the part of it for words beside the content
+  };
+  /// A document in its place.
   struct Ranked {
     explicit Ranked(int64_t document) : id(document) {}
     int64_t id;
     double score = 0;
-    double place_score = 0;   ///< the part for words beside the content
-    size_t first_counts = 0;  ///< where its words' numbers of occurrences begin
-    int64_t number_key = 0;   ///< date or size
+    int64_t number_key = 0;  ///< date or size
     std::string name_key;
   };
 
@@ -46,10 +51,13 @@ class Searcher {
 
   // In which order.
   std::vector<Ranked> RankByRelevance(const DocSet& documents, int64_t total, bool& bounded);
-  std::vector<int64_t> RankedCandidates(const DocSet& documents, int64_t total, bool& bounded);
+  std::vector<Candidate> Candidates(const DocSet& documents, int64_t total, bool& bounded);
   template <typename Take>
-  static void ForEachCandidateHit(const std::vector<Ranked>& candidates, const std::vector<WordHit>& hits, Take take);
-  void AddScores(std::vector<Ranked>& candidates, size_t top);
+  static void ForEachCandidateHit(const std::vector<Candidate>& candidates, const std::vector<WordHit>& hits,
+                                  Take take);
+  void ScoreAtFirstSight(std::vector<Candidate>& candidates, std::vector<uint8_t>& counts);
+  static std::vector<size_t> BestPlaces(const std::vector<Candidate>& candidates, size_t top);
+  double CloseScore(const Candidate& candidate, const uint8_t* counts);
   double LengthFactor(int64_t id, double& freshness);
   std::vector<Ranked> OrderByColumn(const DocSet& documents, int64_t total);
   std::vector<Ranked> OrderFetched(const DocSet& documents);

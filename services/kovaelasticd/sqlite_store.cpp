@@ -63,7 +63,7 @@ Database::Mode OpeningMode(const std::string& path, bool create) {
 IndexStore::~IndexStore() = default;
 
 StoreReader::StoreReader(const std::string& path) : database(path, Database::Mode::kRead) {
-  database.Execute("PRAGMA cache_size = -4096");
+  database.Execute("PRAGMA cache_size = -8192");
   database.Execute("PRAGMA query_only = 1");
   RegisterFullText(database);
 }

@@ -36,14 +36,14 @@ size_t EditDistance(std::string_view a, std::string_view b, size_t limit) {
 
 /// Known words like `word`, with the same first letter: the nearest first, then those in the most documents.
 std::vector<std::string> Searcher::SuggestWord(const std::string& word) {
-  struct Candidate {
+  struct Known {
     size_t distance;
     int64_t documents;
     std::string word;
   };
   if (word.size() < kShortestWord) return {};
   const size_t limit = word.size() < 6 ? 1 : 2;
-  std::vector<Candidate> candidates;
+  std::vector<Known> candidates;
   Statement statement =
       reader_.database.Prepare("SELECT word, documents FROM suggestions WHERE word >= ?1 AND word < ?2");
   const PrefixRange range(word.substr(0, 1));  // the statement refers to its texts
@@ -55,7 +55,7 @@ std::vector<std::string> Searcher::SuggestWord(const std::string& word) {
   }
   const size_t count = std::min(candidates.size(), kSuggestedMax);
   std::partial_sort(candidates.begin(), candidates.begin() + static_cast<ptrdiff_t>(count), candidates.end(),
-                    [](const Candidate& a, const Candidate& b) {
+                    [](const Known& a, const Known& b) {
                       return a.distance != b.distance ? a.distance < b.distance : a.documents > b.documents;
                     });
   std::vector<std::string> words;
