@@ -1,7 +1,10 @@
 #include "common/json_util.h"
 
+#include <algorithm>
 #include <cerrno>
 #include <memory>
+#include <ostream>
+#include <streambuf>
 
 #include <json/reader.h>
 #include <json/writer.h>
@@ -13,12 +16,40 @@ namespace ferrox {
 
 namespace {
 
-std::string Render(const Json::Value& value, const char* indentation) {
+/// A hostile document, nested deep, has a styled form many times its own size.
+constexpr size_t kAppendedMaxBytes = 64 * 1024;
+
+/// Keeps what is written up to a limit, and drops the rest.
+class CappedBuffer : public std::streambuf {
+ public:
+  explicit CappedBuffer(size_t limit_bytes) : limit_bytes_(limit_bytes) {}
+  std::string Text() const { return cut_ ? text_ + "..." : text_; }
+
+ protected:
+  std::streamsize xsputn(const char* data, std::streamsize size) override {
+    const size_t kept = std::min(static_cast<size_t>(size), limit_bytes_ - text_.size());
+    text_.append(data, kept);
+    cut_ = cut_ || kept < static_cast<size_t>(size);
+    return size;
+  }
+  int_type overflow(int_type c) override {
+    const char byte = traits_type::to_char_type(c);
+    if (!traits_type::eq_int_type(c, traits_type::eof())) (void)xsputn(&byte, 1);
+    return traits_type::not_eof(c);
+  }
+
+ private:
+  size_t limit_bytes_;
+  std::string text_;
+  bool cut_ = false;
+};
+
+Json::StreamWriterBuilder WriterBuilder(const char* indentation) {
   Json::StreamWriterBuilder builder;
   builder["commentStyle"] = "None";
   builder["indentation"] = indentation;
   builder["emitUTF8"] = true;
-  return Json::writeString(builder, value);
+  return builder;
 }
 
 std::unique_ptr<Json::CharReader> NewReader() {
@@ -59,7 +90,7 @@ bool fromString(Json::Value& value, const std::string& text) {
   return false;
 }
 
-std::string toString(const Json::Value& value) { return Render(value, ""); }
+std::string toString(const Json::Value& value) { return Json::writeString(WriterBuilder(""), value); }
 
 bool fromFile(Json::Value& value, const std::string& path) {
   std::string text;
@@ -121,7 +152,13 @@ double asJsonType<double>(const Json::Value& value) {
   return value.asDouble();
 }
 
-std::string AppendData(const Json::Value& value) { return ", data=" + Render(value, "\t") + "\n"; }
+std::string AppendData(const Json::Value& value) {
+  const std::unique_ptr<Json::StreamWriter> writer(WriterBuilder("\t").newStreamWriter());
+  CappedBuffer buffer(kAppendedMaxBytes);
+  std::ostream stream(&buffer);
+  (void)writer->write(value, &stream);
+  return ", data=" + buffer.Text() + "\n";
+}
 
 template <typename T>
 void GetJsonValue(T& out, const Json::Value& object, const std::string& key, bool required) {

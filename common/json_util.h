@@ -34,7 +34,7 @@ bool isJsonType(const Json::Value& value);
 template <typename T>
 T asJsonType(const Json::Value& value);
 
-/// ", data=" and the value in the JSON library's styled form, for error texts.
+/// ", data=" and the value in the JSON library's styled form, for error texts; cut at 64 KiB.
 FERROX_EXPORT std::string AppendData(const Json::Value& value);
 
 /// Reads the member `key` of `object` into `out`; for the types above and Json::Value (of any type). A null `object`

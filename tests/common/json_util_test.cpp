@@ -21,6 +21,15 @@ std::string Failure(const std::string& object, bool required) {
   return FailureOf([&] { GetJsonValue(out, Parse(object), "k", required); });
 }
 
+TEST(JsonUtilTest, ErrorTextOfADeepDocumentIsBounded) {
+  const std::string members(20000, '1');
+  std::string text = std::string(900, '[');
+  for (const char member : members) (text += member) += ',';
+  Json::Value deep;
+  ASSERT_TRUE(fromString(deep, text + "1" + std::string(900, ']')));
+  EXPECT_LT(AppendData(deep).size(), 70000U);
+}
+
 }  // namespace
 
 TEST(JsonTextTest, OneValueIsTheWholeText) {
