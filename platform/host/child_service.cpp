@@ -199,9 +199,14 @@ int StopChildService(const ServiceRow& service) {
     return ServiceFailure(KOVA_ERR_SYSTEM, std::string(service.program) + " (process " + std::to_string(pid) +
                                                ") cannot be told to stop: " + strerror(errno));
   }
-  if (WaitUntilGone(service, pid, kStopMax)) return 0;
-  (void)process.Signal(SIGKILL);
-  if (WaitUntilGone(service, pid, kKillMax)) return 0;
+  if (!WaitUntilGone(service, pid, kStopMax)) {
+    (void)process.Signal(SIGKILL);
+  }
+  if (WaitUntilGone(service, pid, kKillMax)) {
+    // It lets go of its pid file shortly before its end.
+    (void)process.WaitForEnd(static_cast<int>(std::chrono::milliseconds(kKillMax).count()));
+    return 0;
+  }
   return ServiceFailure(KOVA_ERR_SYSTEM, std::string(service.program) + " does not end");
 }
 
