@@ -6,6 +6,7 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <utility>
 #include <vector>
 
 #include "common/clock.h"
@@ -138,6 +139,7 @@ milliseconds ShareWorker::Round() {
   try {
     RunOnce();
     delay_ = milliseconds(0);
+    last_failure_ = 0;
     told_no_space_ = false;
     status_.SetState(ShareStatus::State::kIdle);
     return watch_.SeesChanges() ? kSlowTimer : kSlowTimerWithoutWatch;
@@ -156,6 +158,7 @@ milliseconds ShareWorker::Round() {
 }
 
 milliseconds ShareWorker::OnFailure(const Error& error) {
+  if (std::exchange(last_failure_, error.Code()) != error.Code()) delay_ = milliseconds(0);
   index_exists_ = index_exists_ && error.Code() != Error::kEngineNoSuchIndex;
   try {
     if (IsOutOfSpace(error, share_)) return OnNoSpace(error);
@@ -267,8 +270,10 @@ Json::Value ShareWorker::Status() {
   Json::Value json = status_.ToJson();
   json["share"] = share_;
   json["path"] = root_;
-  const uint64_t pending = json["operations"].asUInt64() - json["operations_done"].asUInt64();
-  json["queued"] = Json::UInt64(pending + CountLines(queue_path_));
+  const uint64_t operations = json["operations"].asUInt64();
+  const uint64_t detached =
+      operations != 0 ? operations - json["operations_done"].asUInt64() : CountLines(queue_path_ + ".tmp");
+  json["queued"] = Json::UInt64(detached + CountLines(queue_path_));
   const int64_t oldest = OldestChange({queue_path_ + ".tmp", queue_path_});
   if (oldest > 0) json["oldest_change"] = Json::Int64(oldest);
   json["index"] = index_->Figures();

@@ -79,7 +79,8 @@ class ShareWorker {
   Environment environment_;
   std::unique_ptr<ShareIndex> index_;
   bool index_exists_ = false;
-  std::chrono::milliseconds delay_{0};
+  int last_failure_ = 0;
+  std::chrono::milliseconds delay_{0};  ///< grows while the same failure comes again
   bool told_no_space_ = false;
   ShareStatus status_;
   QueueWatch watch_;
