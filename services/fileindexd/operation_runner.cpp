@@ -33,7 +33,7 @@ bool IsCurrent(const IndexedEntry& indexed, const struct stat& status) {
 enum class Presence { kThere, kGone, kUnknown };
 
 /// What is at `path` for the index: links count as nothing.
-Presence Look(const std::string& path, struct stat& status) {
+Presence LookAt(const std::string& path, struct stat& status) {
   if (lstat(path.c_str(), &status) == 0) return S_ISLNK(status.st_mode) ? Presence::kGone : Presence::kThere;
   return errno == ENOENT || errno == ENOTDIR || errno == ELOOP ? Presence::kGone : Presence::kUnknown;
 }
@@ -41,42 +41,55 @@ Presence Look(const std::string& path, struct stat& status) {
 }  // namespace
 
 struct OperationRunner::Handler {
+  using Function = void (OperationRunner::*)(const std::string& path, const std::string& old_path);
   FileIndexOP op;
-  void (OperationRunner::*run)(const std::string& path, const std::string& old_path);
+  Function move;
+  Function look;
 };
 
 /// Until kinds can be switched off per folder, a changed configuration asks for nothing that a comparison does not do.
 constexpr OperationRunner::Handler OperationRunner::kHandlers[] = {
-    {fileindex::OP_DELETE, &OperationRunner::OnDelete},
-    {fileindex::OP_UPSERT, &OperationRunner::OnUpsert},
-    {fileindex::OP_ATTR, &OperationRunner::OnAttr},
-    {fileindex::OP_UPDATE_CFG, &OperationRunner::OnReindex},
-    {fileindex::OP_RENAME, &OperationRunner::OnRename},
-    {fileindex::OP_REINDEX, &OperationRunner::OnReindex},
-    {fileindex::OP_FULL_REINDEX, &OperationRunner::OnFullReindex},
+    {fileindex::OP_DELETE, &OperationRunner::MoveDelete, &OperationRunner::LookDelete},
+    {fileindex::OP_UPSERT, nullptr, &OperationRunner::LookUpsert},
+    {fileindex::OP_ATTR, nullptr, &OperationRunner::LookAttr},
+    {fileindex::OP_UPDATE_CFG, nullptr, &OperationRunner::LookReindex},
+    {fileindex::OP_RENAME, &OperationRunner::MoveRename, &OperationRunner::LookRename},
+    {fileindex::OP_REINDEX, nullptr, &OperationRunner::LookReindex},
+    {fileindex::OP_FULL_REINDEX, nullptr, &OperationRunner::LookFullReindex},
 };
 
 OperationRunner::OperationRunner(const PassContext& context)
     : context_(context), rules_(context.share, context.root), tasks_(context.pool, context.interruption) {}
 
-void OperationRunner::Run(const fileindex::OP& op) {
+void OperationRunner::Run(const std::function<void(const std::function<void(const fileindex::OP&)>&)>& each) {
+  uint64_t operations = 0;
+  each([&operations](const fileindex::OP&) { ++operations; });
+  context_.status.BeginPass(operations);
+  each([this](const fileindex::OP& op) { CarryOut(op, Stage::kMove); });
+  tasks_.Wait();
+  each([this](const fileindex::OP& op) {
+    CarryOut(op, Stage::kLook);
+    context_.status.OperationDone();
+  });
+  tasks_.Wait();
+  Commit();
+}
+
+void OperationRunner::CarryOut(const fileindex::OP& op, Stage stage) {
   context_.interruption.Check();
   const std::string path = op.node->GetPath();
   const bool ours = path == context_.root || StringStartWith(path, context_.root + "/");
   if (!ours && op.op != fileindex::OP_FULL_REINDEX) {
-    Log(LOG_WARNING, "queue of share %s: %s lies outside of it, skipped", context_.share.c_str(), path.c_str());
-  } else {
-    for (const Handler& handler : kHandlers) {
-      if (handler.op == op.op) (this->*handler.run)(path, op.path);
+    if (stage == Stage::kMove) {
+      Log(LOG_WARNING, "queue of share %s: %s lies outside of it", context_.share.c_str(), path.c_str());
     }
+    return;
   }
-  context_.status.OperationDone();
+  for (const Handler& handler : kHandlers) {
+    const Handler::Function function = stage == Stage::kMove ? handler.move : handler.look;
+    if (handler.op == op.op && function != nullptr) (this->*function)(path, op.path);
+  }
   CommitIfDue();
-}
-
-void OperationRunner::Finish() {
-  tasks_.Wait();
-  Commit();
 }
 
 void OperationRunner::KeepWhatIsDone() noexcept {
@@ -85,11 +98,6 @@ void OperationRunner::KeepWhatIsDone() noexcept {
   } catch (const std::exception&) {
     // What is not committed is done again when the queue is taken up again.
   }
-}
-
-void OperationRunner::Enter(Phase phase) {
-  if (phase_ != phase) tasks_.Wait();
-  phase_ = phase;
 }
 
 /// What has been written becomes searchable and safe while a long pass goes on.
@@ -105,23 +113,60 @@ void OperationRunner::Commit() {
   last_commit_ = std::chrono::steady_clock::now();
 }
 
-/// What is there again is compared instead: of a file that a folder has replaced, the queue keeps the delete alone.
-void OperationRunner::OnDelete(const std::string& path, const std::string&) {
+void OperationRunner::MoveDelete(const std::string& path, const std::string&) {
   struct stat status = {};
-  if (Look(path, status) != Presence::kGone) return Compare(path);
-  Enter(Phase::kDeletes);
+  if (LookAt(path, status) != Presence::kGone) return;
   tasks_.Submit([this, path] { RemoveTree(path); });
 }
 
-void OperationRunner::OnUpsert(const std::string& path, const std::string&) {
-  Enter(Phase::kWrites);
+/// The documents are moved only to spare reading the files again: both places are compared afterwards. Later renames
+/// have carried the earlier ones along in the queue, which then no longer tells what happened (two folders that were
+/// swapped, for example), and an earlier pass may have seen the disk as it is now.
+void OperationRunner::MoveRename(const std::string& path, const std::string& old_path) {
+  tasks_.Wait();
+  const bool within = path != old_path && path != context_.root && StringStartWith(old_path, context_.root + "/");
+  if (!within || !rules_.CanBeIndexed(path) || !rules_.CanBeIndexed(old_path)) return;
+  if (!HoldsDocumentsOf(old_path, path)) return;
+  uncommitted_ = true;
+  try {
+    context_.index.Rename(path, old_path);
+  } catch (const Error& error) {
+    if (error.Code() != Error::kEngineNoSuchDocument) throw;
+  }
+}
+
+/// Whether what the index has at the old path is what is at the new one now. When that has gone on to yet another
+/// place, a later rename will tell; the documents are its, unless there is something new at the old path.
+bool OperationRunner::HoldsDocumentsOf(const std::string& old_path, const std::string& path) {
+  using namespace KOVA::CONTENT_EXTRACT;  // NOLINT: its functions of stamps
+  struct stat status = {};
+  const auto indexed = context_.index.Find(old_path);
+  if (indexed.empty()) return false;
+  if (LookAt(path, status) == Presence::kThere) return SameFile(indexed.front().stamp, Stamp(status));
+  return LookAt(old_path, status) == Presence::kGone;
+}
+
+/// What is there again is compared: of a file that a folder has replaced, the queue keeps the delete alone.
+void OperationRunner::LookDelete(const std::string& path, const std::string&) {
+  struct stat status = {};
+  if (LookAt(path, status) != Presence::kGone) Compare(path);
+}
+
+void OperationRunner::LookRename(const std::string& path, const std::string& old_path) {
+  if (path != context_.root && rules_.CanBeIndexed(path)) {
+    tasks_.Submit([this, path, old_path] { RefreshRenamed(path, old_path); });
+  }
+  if (StringStartWith(old_path, context_.root + "/")) LookReindex(old_path, "");
+  LookReindex(path, "");
+}
+
+void OperationRunner::LookUpsert(const std::string& path, const std::string&) {
   if (path == context_.root) return;
   const bool wanted = rules_.CanBeIndexed(path);
   tasks_.Submit([this, path, wanted] { wanted ? Write(path) : Remove(path); });
 }
 
-void OperationRunner::OnAttr(const std::string& path, const std::string&) {
-  Enter(Phase::kWrites);
+void OperationRunner::LookAttr(const std::string& path, const std::string&) {
   if (path == context_.root) return;
   if (!rules_.CanBeIndexed(path)) {
     tasks_.Submit([this, path] { Remove(path); });
@@ -132,42 +177,9 @@ void OperationRunner::OnAttr(const std::string& path, const std::string&) {
   }
 }
 
-/// The documents move; what the rename brings into the index, or takes out of it, is compared or removed instead.
-void OperationRunner::OnRename(const std::string& path, const std::string& old_path) {
-  tasks_.Wait();
-  compared_.clear();
-  const bool wanted = path != context_.root && rules_.CanBeIndexed(path);
-  const bool was_wanted = old_path != context_.root && rules_.CanBeIndexed(old_path);
-  const bool moves = wanted && was_wanted && !context_.replay && MoveDocuments(path, old_path);
-  if (moves) return RefreshRenamed(path, old_path);
-  if (was_wanted) Compare(old_path);
-  Compare(path);
-}
-
-/// False when there is no document at the old path.
-bool OperationRunner::MoveDocuments(const std::string& path, const std::string& old_path) {
-  uncommitted_ = true;
-  try {
-    context_.index.Rename(path, old_path);
-    return true;
-  } catch (const Error& error) {
-    if (error.Code() != Error::kEngineNoSuchDocument) throw;
-    return false;
-  }
-}
-
-/// A rename changes the moved entry itself, and with another extension the way in which its content is read. When it
-/// is gone already, a later operation knows its present place and still needs the document.
-void OperationRunner::RefreshRenamed(const std::string& path, const std::string& old_path) {
-  struct stat status = {};
-  if (Look(path, status) != Presence::kThere) return;
-  const bool same_kind = GetFileExtension(path, true) == GetFileExtension(old_path, true);
-  tasks_.Submit([this, path, same_kind] { same_kind ? RefreshAttributes(path) : Write(path); });
-}
-
 /// A folder that is copied leaves a reindex for each of its subfolders. All changes of this queue are older than its
-/// first comparison, so what was compared once need not be again, unless a rename has brought old documents there.
-void OperationRunner::OnReindex(const std::string& path, const std::string&) {
+/// first comparison, so what was compared once need not be again.
+void OperationRunner::LookReindex(const std::string& path, const std::string&) {
   for (std::string folder = path; folder.size() >= context_.root.size(); folder = Dirname(folder)) {
     if (compared_.count(folder) != 0) return;
   }
@@ -175,11 +187,11 @@ void OperationRunner::OnReindex(const std::string& path, const std::string&) {
   compared_.insert(path);
 }
 
-void OperationRunner::OnFullReindex(const std::string&, const std::string&) { Compare(context_.root); }
+void OperationRunner::LookFullReindex(const std::string&, const std::string&) { Compare(context_.root); }
 
 void OperationRunner::Write(const std::string& path) {
   struct stat status = {};
-  if (Look(path, status) == Presence::kGone) return Remove(path);
+  if (LookAt(path, status) == Presence::kGone) return Remove(path);
   try {
     uncommitted_ = true;
     context_.index.Upsert(path, S_ISREG(status.st_mode));
@@ -189,9 +201,14 @@ void OperationRunner::Write(const std::string& path) {
   }
 }
 
+/// The attributes alone are refreshed when that cannot make an old content look like a new one.
 void OperationRunner::RefreshAttributes(const std::string& path) {
+  using KOVA::CONTENT_EXTRACT::SameContent;
   struct stat status = {};
-  if (Look(path, status) == Presence::kGone) return Remove(path);
+  if (LookAt(path, status) == Presence::kGone) return Remove(path);
+  const auto indexed = context_.index.Find(path);
+  const bool same = !indexed.empty() && SameContent(indexed.front().stamp, KOVA::CONTENT_EXTRACT::Stamp(status));
+  if (!same) return Write(path);
   try {
     uncommitted_ = true;
     context_.index.Attr(path);
@@ -202,11 +219,20 @@ void OperationRunner::RefreshAttributes(const std::string& path) {
   }
 }
 
+/// A rename changes the moved entry itself, and with another extension the way in which its content is read. When it
+/// is gone already, a later operation knows its present place and still needs the document.
+void OperationRunner::RefreshRenamed(const std::string& path, const std::string& old_path) {
+  struct stat status = {};
+  if (LookAt(path, status) != Presence::kThere) return;
+  const bool same_kind = GetFileExtension(path, true) == GetFileExtension(old_path, true);
+  same_kind ? RefreshAttributes(path) : Write(path);
+}
+
 /// Called while an error is handled: goes on when it is the file's, passes it on when it is the engine's.
 void OperationRunner::RecordFailure(const Error& error, const std::string& path) {
   struct stat status = {};
   if (error.Code() == Error::kParseFailed) {
-    if (Look(path, status) == Presence::kGone) return Remove(path);
+    if (LookAt(path, status) == Presence::kGone) return Remove(path);
     return context_.status.AddFailure("cannot be examined", path);
   }
   if (error.Code() != Error::kEngineBadRequest) throw;
@@ -232,11 +258,10 @@ bool OperationRunner::BecameReadable(const std::string& folder) {
 
 void OperationRunner::Compare(const std::string& path) {
   tasks_.Wait();
-  phase_ = Phase::kWrites;
   if (path != context_.root) {
     if (!StringStartWith(path, context_.root + "/")) return;
     struct stat status = {};
-    const Presence presence = Look(path, status);
+    const Presence presence = LookAt(path, status);
     if (presence == Presence::kUnknown) {
       return context_.status.AddFailure(std::string("cannot be examined: ") + strerror(errno), path);
     }

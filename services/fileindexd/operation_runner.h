@@ -4,6 +4,7 @@
 
 #include <atomic>
 #include <chrono>
+#include <functional>
 #include <set>
 #include <string>
 
@@ -26,50 +27,51 @@ struct PassContext {
   TaskPool& pool;
   const Interruption& interruption;
   ShareStatus& status;
-  /// The queue was begun before: its renames may have been carried out already, and what is at the old path now may be
-  /// another file's document. They are compared instead.
-  bool replay = false;
 };
 
-/// Carries the operations of one pass into the index, in their order as far as it shows: upserts run beside each other,
-/// so do deletes, and everything else waits for what came before it. Each operation may be carried out again, for
-/// example after a crash, and gives the same end. A single bad file is recorded and passed over.
+/// Carries the operations of one pass into the index, in two stages: first what removes and moves documents, in the
+/// queue's order; then what looks at the disk, which is right whatever came before, files beside each other. (The queue
+/// itself may hold a change of a file in front of the rename that brought the file's old document to its place.) Each
+/// operation may be carried out again, for example after a crash, and gives the same end. A single bad file is recorded
+/// and passed over.
 class OperationRunner {
  public:
   explicit OperationRunner(const PassContext& context);
 
-  /// @throws Interrupted; Error when the index cannot be written: the pass is then to be tried again.
-  void Run(const fileindex::OP& op);
-  /// Waits for all that is under way and commits it. @throws likewise.
-  void Finish();
+  /// Carries out what `each` hands over; it is called several times and hands over the same each time.
+  /// @return after a durable commit. @throws Interrupted; Error when the index cannot be written: the pass is then to
+  /// be tried again.
+  void Run(const std::function<void(const std::function<void(const fileindex::OP&)>&)>& each);
   /// Commits what has been done, as far as that works at once. For a pass that ends early.
   void KeepWhatIsDone() noexcept;
 
  private:
-  enum class Phase { kWrites, kDeletes };
   struct Handler;
   static const Handler kHandlers[];
+  enum class Stage { kMove, kLook };
 
-  void OnDelete(const std::string& path, const std::string& old_path);
-  void OnUpsert(const std::string& path, const std::string& old_path);
-  void OnAttr(const std::string& path, const std::string& old_path);
-  void OnRename(const std::string& path, const std::string& old_path);
-  void OnReindex(const std::string& path, const std::string& old_path);
-  void OnFullReindex(const std::string& path, const std::string& old_path);
+  void MoveDelete(const std::string& path, const std::string& old_path);
+  void MoveRename(const std::string& path, const std::string& old_path);
+  void LookDelete(const std::string& path, const std::string& old_path);
+  void LookRename(const std::string& path, const std::string& old_path);
+  void LookUpsert(const std::string& path, const std::string& old_path);
+  void LookAttr(const std::string& path, const std::string& old_path);
+  void LookReindex(const std::string& path, const std::string& old_path);
+  void LookFullReindex(const std::string& path, const std::string& old_path);
 
-  void Enter(Phase phase);
+  void CarryOut(const fileindex::OP& op, Stage stage);
   void CommitIfDue();
   void Commit();
 
   // Carried out by the pool's threads.
   void Write(const std::string& path);
   void RefreshAttributes(const std::string& path);
+  void RefreshRenamed(const std::string& path, const std::string& old_path);
   void Remove(const std::string& path);
   void RemoveTree(const std::string& path);
   void RecordFailure(const Error& error, const std::string& path);
 
-  bool MoveDocuments(const std::string& path, const std::string& old_path);
-  void RefreshRenamed(const std::string& path, const std::string& old_path);
+  bool HoldsDocumentsOf(const std::string& old_path, const std::string& path);
   bool BecameReadable(const std::string& folder);
   void Compare(const std::string& path);
   void CompareOne(const std::string& path, const struct stat& status);
@@ -79,8 +81,7 @@ class OperationRunner {
   PassContext context_;
   PathRules rules_;
   TaskGroup tasks_;
-  Phase phase_ = Phase::kWrites;
-  std::set<std::string> compared_;  ///< since the last rename
+  std::set<std::string> compared_;
   std::atomic<bool> uncommitted_{false};
   std::chrono::steady_clock::time_point last_commit_ = std::chrono::steady_clock::now();
 };

@@ -41,12 +41,6 @@ bool HasContent(const std::string& path) {
   return lstat(path.c_str(), &status) == 0 && S_ISREG(status.st_mode) && status.st_size > 0;
 }
 
-uint64_t CountOperations(const fileindex::OPTree& tree) {
-  if (tree.crashed) return 1;
-  return static_cast<uint64_t>(
-      std::count_if(tree.ops.begin(), tree.ops.end(), [](const auto& op) { return op->op != fileindex::OP_NONE; }));
-}
-
 /// The lines of a queue file; of a long one, as many as its beginning lets expect.
 uint64_t CountLines(const std::string& path) {
   const UniqueFd file(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK));
@@ -206,10 +200,10 @@ void ShareWorker::RunOnce() {
   const std::string detached = queue_path_ + ".tmp";
   do {
     QueueNeededReindex();
-    const bool replay = IsFileExist(detached);
-    if (!replay && !HasContent(queue_path_)) break;
-    if (!replay) interruption_.SleepFor(kGatherTime);
-    RunPass(replay);
+    const bool begun_before = IsFileExist(detached);
+    if (!begun_before && !HasContent(queue_path_)) break;
+    if (!begun_before) interruption_.SleepFor(kGatherTime);
+    RunPass();
   } while (true);
 }
 
@@ -250,14 +244,14 @@ bool ShareWorker::QueueReindex() {
   }
 }
 
-void ShareWorker::RunPass(bool replay) {
+void ShareWorker::RunPass() {
   fileindex::QueueMgr queue(queue_path_);
   if (!queue.PrepareTmpQueue() && !IsFileExist(queue_path_ + ".tmp")) return;
-  status_.BeginPass(CountOperations(*queue.GetOPTreeTmp()));
-  OperationRunner runner({share_, root_, *index_, environment_.pool, interruption_, status_, replay});
+  OperationRunner runner({share_, root_, *index_, environment_.pool, interruption_, status_});
   try {
-    (void)queue.ProcessOP([&runner](std::shared_ptr<fileindex::OP> op) { runner.Run(*op); }, true);
-    runner.Finish();
+    runner.Run([&queue](const std::function<void(const fileindex::OP&)>& take) {
+      (void)queue.ProcessOP([&take](const std::shared_ptr<fileindex::OP>& op) { take(*op); }, true);
+    });
   } catch (const Interrupted&) {
     runner.KeepWhatIsDone();
     throw;

@@ -71,7 +71,7 @@ class ShareWorker {
   void EnsureIndex();
   void QueueNeededReindex();
   bool QueueReindex();
-  void RunPass(bool replay);
+  void RunPass();
 
   std::string share_;
   std::string root_;

@@ -294,9 +294,15 @@ TEST_F(ContentExtractTest, TheStampFollowsTheFile) {
   WriteFile(dir_ / "a", "22");
   const string longer = Parse("a", false)["_KOVAStamp"].asString();
   EXPECT_NE(first, longer);
+  EXPECT_TRUE(KOVA::CONTENT_EXTRACT::SameFile(first, longer));
+  EXPECT_FALSE(KOVA::CONTENT_EXTRACT::SameContent(first, longer));
+  std::filesystem::permissions(dir_ / "a", std::filesystem::perms::owner_all);
+  const string attributes = Parse("a", false)["_KOVAStamp"].asString();
+  EXPECT_TRUE(KOVA::CONTENT_EXTRACT::SameContent(longer, attributes));
   WriteFile(dir_ / "b", "33");
   std::filesystem::rename(dir_ / "b", dir_ / "a");
-  EXPECT_NE(longer, Parse("a", false)["_KOVAStamp"].asString());
+  EXPECT_NE(attributes, Parse("a", false)["_KOVAStamp"].asString());
+  EXPECT_FALSE(KOVA::CONTENT_EXTRACT::SameFile(attributes, Parse("a", false)["_KOVAStamp"].asString()));
 }
 
 }  // namespace

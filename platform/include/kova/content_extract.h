@@ -25,5 +25,8 @@ void ParseFile(const std::string& path, const Json::Value& config, Json::Value& 
 /// The "_KOVAStamp" that ParseFile gives a file whose `lstat` is `status`: a short text without control characters.
 /// It changes when size, mtime (with nanoseconds), ctime or inode does, and does not depend on the path.
 std::string Stamp(const struct stat& status);
+/// Whether two stamps are of one file (inode), and of one with the same content as far as size and mtime tell.
+bool SameFile(const std::string& stamp, const std::string& other);
+bool SameContent(const std::string& stamp, const std::string& other);
 
 }  // namespace KOVA::CONTENT_EXTRACT
