@@ -11,6 +11,7 @@
 #include "cli/format.h"
 #include "cli/progress.h"
 #include "common/error.h"
+#include "common/file_util.h"
 #include "fileindex/optree.h"
 #include "fileindex/queue_mgr.h"
 #include "fileindex/status_mgr.h"
@@ -43,13 +44,27 @@ Share OpenShare(const std::string& name) {
   }
 }
 
-/// A queue with a damaged line takes no event; the library then has marked the share, which comes to the same.
+Json::Value ShareName(const Share& share) {
+  Json::Value data;
+  data["share_name"] = share.name;
+  data["is_upsert"] = true;
+  return data;
+}
+
+/// A reindex that is being carried out may have passed by what has changed since, yet the library takes it for one that
+/// is still to come. Then the share is marked, and the daemon queues another one when it has finished. The library
+/// itself marks the share when its queue has a damaged line and takes no event.
 void QueueReindex(const Share& share) {
   try {
-    fileindex::AddCustomEvent(fileindex::EVENT_REINDEX, share.path, "", Json::Value());
+    if (IsFileExist(share.queue_path + ".tmp")) {
+      fileindex::StatusMgr().SetShareStatus(share.name, fileindex::StatusMgr::kNeedReindex);
+    } else {
+      fileindex::AddCustomEvent(fileindex::EVENT_REINDEX, share.path, "", Json::Value());
+    }
   } catch (const Error& error) {
     if (error.Code() != Error::kMalformedEvent && error.Code() != Error::kBadArgument) throw;
   }
+  (void)AskIndexDaemonIfRunning("notify_setting_changed", ShareName(share));
 }
 
 Json::Value ShareStatusOf(const std::string& name) {
@@ -108,12 +123,6 @@ int RunIndex(const Arguments& arguments) {
   const auto begin = SteadyClock::now();
   if (!arguments.Has("--wait")) {
     QueueReindex(share);
-    (void)AskIndexDaemonIfRunning("notify_setting_changed", [&share] {
-      Json::Value data;
-      data["share_name"] = share.name;
-      data["is_upsert"] = true;
-      return data;
-    }());
     (void)printf("queued: share %s will be compared with its index\n", EscapeForTerminal(share.name).c_str());
     return kDone;
   }
