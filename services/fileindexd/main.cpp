@@ -15,14 +15,19 @@ constexpr char kUsage[] =
     "Keeps the search index of each share in step with the share's queue of changes.\n"
     "  --workers N   threads that read files (default: one a processor, at least 2)\n"
     "  --help        this text\n"
+    "  --version     the version\n"
     "The environment variable FERROX_ROOT chooses the instance.\n";
 
-/// False when the arguments cannot be understood.
-bool ParseArguments(int argc, char** argv, ferrox::indexd::IndexDaemon::Options& options, bool& help) {
-  const option known[] = {{"workers", required_argument, nullptr, 'w'}, {"help", no_argument, nullptr, 'h'}, {}};
+/// False when the arguments cannot be understood. `answer` is what is only to be printed.
+bool ParseArguments(int argc, char** argv, ferrox::indexd::IndexDaemon::Options& options, const char*& answer) {
+  const option known[] = {{"workers", required_argument, nullptr, 'w'},
+                          {"help", no_argument, nullptr, 'h'},
+                          {"version", no_argument, nullptr, 'v'},
+                          {}};
   for (int letter = 0; (letter = getopt_long(argc, argv, "", known, nullptr)) != -1;) {
     if (letter == '?') return false;
-    help = help || letter == 'h';
+    if (letter == 'h') answer = kUsage;
+    if (letter == 'v') answer = "fileindexd " FERROX_VERSION "\n";
     if (letter == 'w') options.workers = static_cast<unsigned>(strtoul(optarg, nullptr, 10));
     if (letter == 'w' && (options.workers == 0 || options.workers > 256)) return false;
   }
@@ -33,10 +38,10 @@ bool ParseArguments(int argc, char** argv, ferrox::indexd::IndexDaemon::Options&
 
 int main(int argc, char** argv) try {
   ferrox::indexd::IndexDaemon::Options options;
-  bool help = false;
-  const bool understood = ParseArguments(argc, argv, options, help);
-  if (!understood || help) {
-    (void)fputs(kUsage, understood ? stdout : stderr);
+  const char* answer = nullptr;
+  const bool understood = ParseArguments(argc, argv, options, answer);
+  if (!understood || answer != nullptr) {
+    (void)fputs(understood ? answer : kUsage, understood ? stdout : stderr);
     return understood ? 0 : 2;
   }
   ferrox::services::Daemon daemon("fileindexd");
