@@ -140,7 +140,7 @@ void Index::LoseChanges() {
   uncommitted_ = 0;
   try {
     store_->Rollback();
-  } catch (const Error&) {
+  } catch (const std::exception&) {
     // Logged where it arose; the next change meets the same fault and reports it.
   }
 }
@@ -172,7 +172,7 @@ void Index::CommitByItself() {
   try {
     CommitStore();
     if (!lost_) Unmark();
-  } catch (const Error&) {
+  } catch (const std::exception&) {
     // Logged where it arose; the next commit that somebody asks for fails.
   }
 }

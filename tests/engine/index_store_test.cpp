@@ -257,6 +257,45 @@ TEST_P(IndexStoreTest, EveryOrderAndPageIsExact) {
   }
 }
 
+// So many that conditions are not checked one by one and keys are not fetched and sorted.
+TEST_P(IndexStoreTest, ManyDocumentsAreFilteredAndOrderedExactly) {
+  constexpr int kCount = 6000;
+  for (int i = 0; i < kCount; ++i) {
+    const std::string name = std::to_string(100000 + i * 7919 % kCount) + (i % 3 == 0 ? ".txt" : ".jpg");
+    Json::Value document = FileDocument("/v/" + std::string(i % 2 == 0 ? "a/" : "b/") + name, "word");
+    document["KOVAMDFSSize"] = i * 13 % kCount;
+    document["KOVAMDFSContentChangeDate"] = i * 7 % kCount;
+    Put(document);
+  }
+  store_->Commit();
+  const std::pair<const char*, int64_t> kRows[] = {{"word -ext:txt", 4000},   {"word ext:txt", 2000},
+                                                   {"word kind:image", 4000}, {"word path:/v/a", 3000},
+                                                   {"word -path:/v/a", 3000}, {"word size:>=1000", 5000},
+                                                   {"-kind:image", 2000},     {"word date:1970-01-01", 6000},
+                                                   {"-size:<5999", 1},        {"word ext:txt path:/v/b", 1000},
+                                                   {"name:1059", 101}};
+  for (const auto& [query, total] : kRows) EXPECT_EQ(Find(*store_, query).total, total) << query;
+  const std::pair<SortKey, const char*> kOrders[] = {{SortKey::kDate, "KOVAMDFSContentChangeDate"},
+                                                     {SortKey::kSize, "KOVAMDFSSize"},
+                                                     {SortKey::kName, "KOVAMDFSName"}};
+  for (const auto& [sort, field] : kOrders) {
+    for (const bool ascending : {true, false}) {
+      SearchRequest request;
+      request.sort = sort;
+      request.ascending = ascending;
+      request.offset = 100;
+      request.limit = 3;
+      const SearchReply reply = Find(*store_, "word", request);
+      ASSERT_EQ(reply.hits.size(), 3U);
+      for (int i = 0; i < 3; ++i) {
+        const int place = ascending ? 100 + i : kCount - 101 - i;
+        const std::string found = reply.hits[static_cast<size_t>(i)].fields[field].asString();
+        EXPECT_EQ(found.substr(0, found.find('.')), std::to_string(sort == SortKey::kName ? 100000 + place : place));
+      }
+    }
+  }
+}
+
 TEST_P(IndexStoreTest, BetterHitsComeFirst) {
   Put("/v/mentions.txt", "a long text with many words and one lonely turbine in it " + std::string(4000, '.'));
   Put("/v/about.txt", "turbine turbine turbine and its blades");
