@@ -48,6 +48,7 @@ struct Command {
   std::vector<Option> options;
   const char* help;
   int (*run)(const Arguments& arguments);
+  bool changes = false;  ///< what it does needs the instance's folders
 };
 
 /// Sorts a command's words and options. "--" ends the options. @throws UsageError.

@@ -1,5 +1,6 @@
 #include <unistd.h>
 
+#include <algorithm>
 #include <cstdio>
 
 #include "cli/ask.h"
@@ -8,6 +9,7 @@
 #include "cli/format.h"
 #include "fileindex/elastic/elastic_control.h"
 #include "fileindex/util.h"
+#include "sdk/share.h"
 
 namespace ferrox::cli {
 
@@ -25,9 +27,16 @@ std::string JoinWords(const std::vector<std::string>& words) {
   return query;
 }
 
+void RequireShare(const std::string& name) {
+  const std::vector<std::string> shares = sdk::SDKShare::Enum();
+  if (std::find(shares.begin(), shares.end(), name) != shares.end()) return;
+  throw Failure("there is no share \"" + name + "\"; 'fileindexctl share list' shows them");
+}
+
 Json::Value SearchRequest(const Arguments& arguments) {
   Json::Value data;
   data["query"] = JoinWords(arguments.words);
+  if (arguments.Has("--share")) RequireShare(arguments.Get("--share"));
   if (arguments.Has("--share")) data["id"] = fileindex::elastic::GetFileIndexID(arguments.Get("--share"));
   data["limit"] = Json::Int64(arguments.Number("--limit", kLimitDefault, 1, kLimitMax));
   data["offset"] = Json::Int64(arguments.Number("--offset", 0, 0, 1000000000));

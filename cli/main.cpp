@@ -23,7 +23,7 @@ using namespace ferrox::cli;  // NOLINT: the tool's own
 const Option kJson = {"--json", nullptr, "one line of JSON for scripts"};
 
 const Command kCommands[] = {
-    {"up", "", 0, 0, {}, "Starts the search engine and the index daemon, and waits until they answer.", &RunUp},
+    {"up", "", 0, 0, {}, "Starts the search engine and the index daemon, and waits until they answer.", &RunUp, true},
     {"down", "", 0, 0, {}, "Stops both.", &RunDown},
     {"status",
      "",
@@ -39,7 +39,8 @@ const Command kCommands[] = {
      {{"--name", "NAME", "the share's name (default: the folder's last component, which it must equal)"},
       {"--replace", nullptr, "an earlier share of that name, with another folder, makes way"}},
      "Makes a folder a share and has it indexed.",
-     &RunShareAdd},
+     &RunShareAdd,
+     true},
     {"share list", "", 0, 0, {kJson}, "Lists the shares: name and folder.", &RunShareList},
     {"share remove",
      "SHARE",
@@ -54,7 +55,8 @@ const Command kCommands[] = {
      1,
      {{"--wait", nullptr, "wait until it is done, and show progress"}},
      "Has a share compared with its index; what differs is indexed.",
-     &RunIndex},
+     &RunIndex,
+     true},
     {"search",
      "QUERY...",
      1,
@@ -67,8 +69,15 @@ const Command kCommands[] = {
      "Finds files. All words must match; \"a phrase\", prefix*, OR, NOT, ( ), kind:, ext:, path:, size: and date: "
      "work.",
      &RunSearch},
-    {"pause", "[HOURS]", 0, 1, {}, "Pauses indexing, for some hours or until 'resume'. Searching goes on.", &RunPause},
-    {"resume", "", 0, 0, {}, "Ends a pause.", &RunResume},
+    {"pause",
+     "[HOURS]",
+     0,
+     1,
+     {},
+     "Pauses indexing, for some hours or until 'resume'. Searching goes on.",
+     &RunPause,
+     true},
+    {"resume", "", 0, 0, {}, "Ends a pause.", &RunResume, true},
     {"queue show",
      "FILE",
      1,
@@ -138,10 +147,10 @@ bool TakeGlobalOptions(std::vector<std::string>& words) {
 }
 
 /// An instance of its own begins as an empty folder; the host's own has its folders from its package.
-void PrepareInstance() {
+void PrepareInstance(bool changes) {
   const std::string problem = ferrox::InstanceRootProblem();
   if (!problem.empty()) throw Failure(problem);
-  if (ferrox::InstancePath("").empty()) return;
+  if (!changes || ferrox::InstancePath("").empty()) return;
   for (const char* folder : {"/tmp", "/var/run", ferrox::kConfigurationFolder}) {
     const std::string path = ferrox::InstancePath(folder);
     if (!ferrox::services::MakeFolders(path)) throw Failure("cannot make " + path + ": " + ferrox::ErrnoText());
@@ -159,7 +168,7 @@ int Run(std::vector<std::string> words) {
       (void)fputs(HelpFor(*command).c_str(), stdout);
       return kDone;
     }
-    PrepareInstance();
+    PrepareInstance(command->changes);
     return command->run(arguments);
   } catch (const UsageError& error) {
     throw UsageError(std::string(error.what()) + "\nUsage: " + UsageLine(*command));

@@ -208,6 +208,7 @@ class DaemonsTest(unittest.TestCase):
             (2, "--limit", ["search", "--limit", "0", "x"]),
             (2, "missing", ["index"]),
             (3, "fileindexctl up", ["search", "x"]),
+            (3, "share list", ["search", "--share", "nonexistent", "x"]),
             (3, "No such file", ["queue", "show", "/nonexistent"]),
             (3, "share list", ["index", "nonexistent"]),
             (3, "no such folder", ["share", "add", "/nonexistent"]),
