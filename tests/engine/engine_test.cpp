@@ -1,5 +1,6 @@
 #include "services/kovaelasticd/engine.h"
 
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include <filesystem>
@@ -178,6 +179,22 @@ TEST_F(EngineTest, IndicesPauseMoveRenameAndGo) {
   EXPECT_EQ(Code("index_delete", R"({"id":"b"})"), 0);
   EXPECT_FALSE(std::filesystem::exists(folder_ / "deep/b"));
   EXPECT_EQ(Total("lantern"), 0);
+}
+
+TEST_F(EngineTest, MovesToAnotherVolume) {
+  struct stat here = {};
+  struct stat there = {};
+  const bool other_volume = stat(folder_.Path().c_str(), &here) == 0 && stat("/dev/shm", &there) == 0 &&
+                            here.st_dev != there.st_dev && access("/dev/shm", W_OK) == 0;
+  if (!other_volume) GTEST_SKIP() << "there is no second volume";
+  const test::TempDir volume("/dev/shm");
+  ASSERT_EQ(Create("a", "a"), 0);
+  ASSERT_EQ(Put("a", "/v/1", "lantern"), 0);
+  EXPECT_EQ(Code("index_config_set", R"({"id":"a","data":{"path":")" + (volume / "a") + "\"}}"), 0);
+  EXPECT_FALSE(std::filesystem::exists(folder_ / "a"));
+  Restart();
+  EXPECT_EQ(Total("lantern", "a"), 1);
+  engine_.reset();
 }
 
 TEST_F(EngineTest, ADamagedIndexDoesNotHideTheOthers) {

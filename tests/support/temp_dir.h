@@ -8,6 +8,8 @@ namespace ferrox::test {
 class TempDir {
  public:
   TempDir();
+  /// The same below `parent`.
+  explicit TempDir(const std::string& parent);
   TempDir(const TempDir&) = delete;
   TempDir& operator=(const TempDir&) = delete;
   ~TempDir();
