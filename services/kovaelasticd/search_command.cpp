@@ -71,6 +71,7 @@ std::vector<Registry::OpenIndex> ReadIndices(CommandCall& call) {
     ids.push_back(id.asString());
   }
   std::vector<Registry::OpenIndex> indices;
+  indices.reserve(ids.size());
   for (const std::string& id : ids) indices.push_back(call.registry.Open(id));
   if (!ids.empty() || named.isArray()) return indices;
   for (const Registry::Listed& listed : call.registry.List()) {
