@@ -264,6 +264,9 @@ Json::Value ShareWorker::Status() {
   Json::Value json = status_.ToJson();
   json["share"] = share_;
   json["path"] = root_;
+  // The worker may not have noticed yet that the pause is over.
+  const bool pause_over = json["state"] == "paused" && !json.isMember("detail") && !environment_.pause.Paused();
+  if (pause_over) json["state"] = "starting";
   const uint64_t operations = json["operations"].asUInt64();
   const uint64_t detached =
       operations != 0 ? operations - json["operations_done"].asUInt64() : CountLines(queue_path_ + ".tmp");

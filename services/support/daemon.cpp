@@ -11,9 +11,11 @@
 #include <unistd.h>
 
 #include <cerrno>
+#include <chrono>
 #include <cstdlib>
 #include <cstring>
 
+#include "common/clock.h"
 #include "common/file_util.h"
 #include "common/log.h"
 #include "common/paths.h"
@@ -32,11 +34,22 @@ UniqueFd BlockSignals() {
   return UniqueFd(signalfd(-1, &set, SFD_CLOEXEC | SFD_NONBLOCK));
 }
 
+/// A process that was killed lets go of its locks only when the last of its threads has ended.
+bool LockWithPatience(int fd) {
+  constexpr int kAttempts = 20;
+  constexpr std::chrono::milliseconds kPause(50);
+  for (int attempt = 1; flock(fd, LOCK_EX | LOCK_NB) != 0; ++attempt) {
+    if (errno != EWOULDBLOCK || attempt == kAttempts) return false;
+    Clock::Get().SleepFor(kPause);
+  }
+  return true;
+}
+
 /// The pid file of a running process is locked by it; what is written in it is only for people.
 UniqueFd TakePidFile(const std::string& path, const std::string& name) {
   UniqueFd file(open(path.c_str(), O_RDWR | O_CREAT | O_CLOEXEC | O_NOFOLLOW, 0644));
   FERROX_FAIL_IF(!file.Valid(), Error::kInternal, "cannot open " + path + ": " + ErrnoText());
-  FERROX_FAIL_IF(flock(file.Get(), LOCK_EX | LOCK_NB) != 0, Error::kInternal,
+  FERROX_FAIL_IF(!LockWithPatience(file.Get()), Error::kInternal,
                  name + " runs already in this instance (" + path + " is locked); stop it first");
   const std::string text = std::to_string(getpid()) + "\n";
   const bool written =
