@@ -1,5 +1,5 @@
-# What is installed: the two libraries, their headers below include/libfileindex, and what other projects find them by
-# (the CMake package "fileindex" and pkg-config's "libfileindex").
+# What is installed beside the programs: the two libraries, their headers below include/libfileindex, what other projects
+# find them by (the CMake package "fileindex" and pkg-config's "libfileindex"), and the man pages.
 include(CMakePackageConfigHelpers)
 
 set(package_folder ${CMAKE_INSTALL_LIBDIR}/cmake/fileindex)
@@ -26,3 +26,6 @@ install(FILES ${CMAKE_BINARY_DIR}/fileindexConfig.cmake ${CMAKE_BINARY_DIR}/file
 
 configure_file(${CMAKE_CURRENT_LIST_DIR}/libfileindex.pc.in ${CMAKE_BINARY_DIR}/libfileindex.pc @ONLY)
 install(FILES ${CMAKE_BINARY_DIR}/libfileindex.pc DESTINATION ${CMAKE_INSTALL_LIBDIR}/pkgconfig)
+
+install(DIRECTORY ${CMAKE_SOURCE_DIR}/docs/man/ DESTINATION ${CMAKE_INSTALL_MANDIR}/man1 FILES_MATCHING PATTERN "*.1")
+install(DIRECTORY ${CMAKE_SOURCE_DIR}/docs/man/ DESTINATION ${CMAKE_INSTALL_MANDIR}/man8 FILES_MATCHING PATTERN "*.8")
