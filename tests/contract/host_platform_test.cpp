@@ -206,11 +206,9 @@ TEST_F(HostPlatformTest, AnOrdinaryInstanceBelongsToItsOwner) {
 
 TEST_F(HostPlatformTest, FileSystemsAreToldApart) {
   EXPECT_EQ(KOVA_FS_PSEUDO, KOVAGetFSType("/proc/self", 0));
-  EXPECT_EQ(KOVA_FS_PSEUDO, KOVAGetFSType("/sys", 0));
   EXPECT_NE(KOVA_FS_PSEUDO, KOVAGetFSType(dir_.Path().c_str(), 0));
   EXPECT_LT(KOVAGetFSType((dir_ / "missing").c_str(), 0), 0);
   EXPECT_EQ(1, KOVAFSDirIsMntPoint("/proc"));
-  EXPECT_EQ(1, KOVAFSDirIsMntPoint("/"));
   EXPECT_EQ(0, KOVAFSDirIsMntPoint(dir_.Path().c_str()));
   EXPECT_EQ(0, KOVAFSDirIsMntPoint("/proc/version"));
   EXPECT_LT(KOVAFSDirIsMntPoint((dir_ / "missing").c_str()), 0);
