@@ -194,7 +194,7 @@ void OperationRunner::Write(const std::string& path) {
   if (LookAt(path, status) == Presence::kGone) return Remove(path);
   try {
     uncommitted_ = true;
-    context_.index.Upsert(path, S_ISREG(status.st_mode));
+    context_.index.Upsert(path, !S_ISDIR(status.st_mode));
     context_.status.DocumentsWritten(1);
   } catch (const Error& error) {
     RecordFailure(error, path);
