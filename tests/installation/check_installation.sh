@@ -12,7 +12,7 @@ check() { [ "$("$@")" = "$expected" ] || { echo "wrong answer from $*"; exit 1; 
 
 run cmake --install "$build" --prefix "$work/first"
 mv "$work/first" "$work/moved"
-run cmake -S "$project" -B "$work/cmake" -DCMAKE_PREFIX_PATH="$work/moved" -DCMAKE_CXX_COMPILER="$compiler"
+run cmake -G Ninja -S "$project" -B "$work/cmake" -DCMAKE_PREFIX_PATH="$work/moved" -DCMAKE_CXX_COMPILER="$compiler"
 run cmake --build "$work/cmake" -j2
 check "$work/cmake/uses_fileindex"
 
