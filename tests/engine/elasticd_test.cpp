@@ -91,15 +91,20 @@ TEST_F(ElasticdTest, KilledAtAnyMomentItFindsEveryCommittedDocument) {
     answered = committed;
 
     const pid_t victim = pid_;
-    const auto delay = std::chrono::microseconds(random() % 60000);
-    std::thread killer([victim, delay] {
-      std::this_thread::sleep_for(delay);
-      (void)kill(victim, SIGKILL);
-    });
+    const auto delay = std::chrono::microseconds(random() % 20000);
+    unsigned commits_left = 1 + random() % 8;  // so many come first, however slow the machine is
+    std::thread killer;
     while (Succeeds(Upsert(answered))) {
       ++answered;
-      if (random() % 8 == 0 && Succeeds(kCommit)) committed = answered;
+      if (random() % 8 != 0 || !Succeeds(kCommit)) continue;
+      committed = answered;
+      if (--commits_left != 0) continue;
+      killer = std::thread([victim, delay] {
+        std::this_thread::sleep_for(delay);
+        (void)kill(victim, SIGKILL);
+      });
     }
+    ASSERT_TRUE(killer.joinable()) << "it ended before it was killed";
     killer.join();
     Stop(SIGKILL);
   }
