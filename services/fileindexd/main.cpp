@@ -58,5 +58,5 @@ int main(int argc, char** argv) try {
   return 0;
 } catch (const std::exception& error) {
   (void)fprintf(stderr, "fileindexd: %s\n", error.what());
-  return 1;
+  return 3;
 }
