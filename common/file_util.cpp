@@ -38,9 +38,7 @@ bool WriteAll(int fd, std::string_view content) {
 
 bool SyncFolderOf(const std::string& path) {
   const size_t slash = path.rfind('/');
-  const std::string name = slash == std::string::npos ? "." : path.substr(0, slash + 1);
-  const UniqueFd folder(open(name.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
-  return folder.Valid() && fsync(folder.Get()) == 0;
+  return SyncFolder(slash == std::string::npos ? "." : path.substr(0, slash + 1));
 }
 
 /// Writes `content` to the file at `path`, which is to replace `old` (null: there is none), and makes it durable.
@@ -156,6 +154,11 @@ bool WriteWholeFile(const std::string& path, std::string_view content) {
   (void)unlink(beside.c_str());
   errno = saved_errno;
   return false;
+}
+
+bool SyncFolder(const std::string& folder) {
+  const UniqueFd opened(open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+  return opened.Valid() && fsync(opened.Get()) == 0;
 }
 
 bool ReadWholeFile(const std::string& path, std::string& content) {

@@ -67,6 +67,9 @@ FERROX_EXPORT bool ChownFerrox(const std::string& path);
 /// the folder that could not be synced.
 FERROX_EXPORT bool WriteWholeFile(const std::string& path, std::string_view content);
 
+/// Makes the names in `folder` durable; false, with errno set, when that fails.
+FERROX_EXPORT bool SyncFolder(const std::string& folder);
+
 /// Reads the whole content of a regular file; false, with errno set, when it cannot be read.
 FERROX_EXPORT bool ReadWholeFile(const std::string& path, std::string& content);
 

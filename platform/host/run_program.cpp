@@ -10,6 +10,7 @@
 
 #include <kova/service.h>
 
+#include "platform/base/arguments.h"
 #include "platform/base/failure.h"
 
 namespace kova::host {
@@ -67,24 +68,12 @@ int RunProgram(const std::string& path, const std::vector<std::string>& argument
   return WIFEXITED(status) ? WEXITSTATUS(status) : KOVA_FAIL(KOVA_ERR_SYSTEM);
 }
 
-namespace {
-
-std::vector<std::string> Collect(const char* first, va_list more) {
-  std::vector<std::string> arguments;
-  for (const char* argument = first; argument != nullptr; argument = va_arg(more, const char*)) {
-    arguments.emplace_back(argument);
-  }
-  return arguments;
-}
-
-}  // namespace
-
 }  // namespace kova::host
 
 int KLIBCExec(const char* path, const char* argument, ...) {
   va_list more;
   va_start(more, argument);
-  const std::vector<std::string> arguments = kova::host::Collect(argument, more);
+  const std::vector<std::string> arguments = kova::CollectArguments(argument, more);
   va_end(more);
   return kova::host::RunProgram(path, arguments);
 }
@@ -93,7 +82,7 @@ int KLIBCExecl(const char* path, unsigned int options, const char* argument, ...
   (void)options;
   va_list more;
   va_start(more, argument);
-  const std::vector<std::string> arguments = kova::host::Collect(argument, more);
+  const std::vector<std::string> arguments = kova::CollectArguments(argument, more);
   va_end(more);
   return kova::host::RunProgram(path, arguments);
 }

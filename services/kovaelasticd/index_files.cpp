@@ -1,36 +1,27 @@
 #include "services/kovaelasticd/index_files.h"
 
-#include <fcntl.h>
-#include <sys/stat.h>
 #include <unistd.h>
 
 #include <cerrno>
 
 #include "common/file_util.h"
 #include "common/log.h"
-#include "common/unique_fd.h"
 #include "services/support/daemon.h"
 
 namespace ferrox::engine {
-
-namespace {
-
-void SyncFolder(const std::string& folder) {
-  const UniqueFd descriptor(open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
-  FERROX_FAIL_IF(!descriptor.Valid() || fsync(descriptor.Get()) != 0, Error::kEngineStorage,
-                 "folder " + folder + " cannot be synced: " + ErrnoText());
-}
-
-}  // namespace
 
 std::string IndexFile(const std::string& folder) { return folder + "/index.sqlite"; }
 
 std::string MarkerFile(const std::string& folder) { return folder + "/uncommitted"; }
 
+void SyncIndexFolder(const std::string& folder) {
+  FERROX_FAIL_IF(!SyncFolder(folder), Error::kEngineStorage, "folder " + folder + " cannot be synced: " + ErrnoText());
+}
+
 void MakeIndexFolder(const std::string& folder) {
   FERROX_FAIL_IF(!services::MakeFolders(folder, 0700), Error::kEngineStorage,
                  "cannot make the folder " + folder + ": " + ErrnoText());
-  SyncFolder(Dirname(folder).empty() ? "/" : Dirname(folder));
+  SyncIndexFolder(Dirname(folder).empty() ? "/" : Dirname(folder));
 }
 
 void RemoveIndexFiles(const std::string& folder) {
@@ -51,7 +42,7 @@ void MoveIndexFiles(const std::string& from, const std::string& to) {
     FERROX_FAIL_IF(errno != EXDEV || !CPFile(IndexFile(from), IndexFile(to)), Error::kEngineStorage,
                    "cannot move " + IndexFile(from) + " to " + to + ": " + ErrnoText());
   }
-  SyncFolder(to);
+  SyncIndexFolder(to);
   RemoveIndexFiles(from);
 }
 

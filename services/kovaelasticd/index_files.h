@@ -8,6 +8,8 @@ namespace ferrox::engine {
 std::string IndexFile(const std::string& folder);
 std::string MarkerFile(const std::string& folder);
 
+/// Makes the names in an index's folder durable. @throws Error kEngineStorage.
+void SyncIndexFolder(const std::string& folder);
 /// Makes the folder for an index. @throws Error kEngineStorage.
 void MakeIndexFolder(const std::string& folder);
 /// Removes an index's files, and its folder when nothing else is in it. @throws Error kEngineStorage.

@@ -1,13 +1,12 @@
 #include "services/kovaelasticd/sqlite_store.h"
 
-#include <fcntl.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
 #include "common/file_util.h"
 #include "common/log.h"
-#include "common/unique_fd.h"
 #include "services/kovaelasticd/fts.h"
+#include "services/kovaelasticd/index_files.h"
 #include "services/kovaelasticd/sqlite_search.h"
 
 namespace ferrox::engine {
@@ -43,12 +42,6 @@ constexpr const char* kTables[] = {
     "INSERT INTO meta_fts(meta_fts, rank) VALUES('pgsz', 8100)",
 };
 
-void SyncFolder(const std::string& folder) {
-  const UniqueFd descriptor(open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
-  FERROX_FAIL_IF(!descriptor.Valid() || fsync(descriptor.Get()) != 0, Error::kEngineStorage,
-                 "folder " + folder + " cannot be synced: " + ErrnoText());
-}
-
 int64_t BytesOnDisk(const std::string& path) {
   struct stat status = {};
   return stat(path.c_str(), &status) == 0 ? int64_t{status.st_blocks} * 512 : 0;
@@ -81,7 +74,7 @@ SqliteStore::SqliteStore(const std::string& path, bool create, std::shared_ptr<c
   CheckFormat();
   LoadFieldNames(writer_, names_);
   totals_ = LoadTotals(writer_);
-  SyncFolder(Dirname(path));
+  SyncIndexFolder(Dirname(path));
 }
 
 SqliteStore::~SqliteStore() = default;

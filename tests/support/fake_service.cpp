@@ -5,6 +5,7 @@
 #include <kova/content_extract.h>
 #include <kova/service.h>
 
+#include "platform/base/arguments.h"
 #include "platform/base/failure.h"
 #include "tests/support/fake_platform.h"
 
@@ -31,14 +32,6 @@ int Execute(const char* function, FakeProgram program) {
   return FakePlatform::Get().exec_status;
 }
 
-std::vector<std::string> Collect(const char* first, va_list more) {
-  std::vector<std::string> arguments;
-  for (const char* argument = first; argument != nullptr; argument = va_arg(more, const char*)) {
-    arguments.emplace_back(argument);
-  }
-  return arguments;
-}
-
 }  // namespace
 
 int KLIBServiceStart(const char* name, int now) {
@@ -62,7 +55,7 @@ int KLIBServiceIsRunning(const char* name) {
 int KLIBCExec(const char* path, const char* argument, ...) {
   va_list more;
   va_start(more, argument);
-  std::vector<std::string> arguments = Collect(argument, more);
+  std::vector<std::string> arguments = kova::CollectArguments(argument, more);
   va_end(more);
   return Execute(__func__, {path, 0, std::move(arguments)});
 }
@@ -70,7 +63,7 @@ int KLIBCExec(const char* path, const char* argument, ...) {
 int KLIBCExecl(const char* path, unsigned int options, const char* argument, ...) {
   va_list more;
   va_start(more, argument);
-  std::vector<std::string> arguments = Collect(argument, more);
+  std::vector<std::string> arguments = kova::CollectArguments(argument, more);
   va_end(more);
   return Execute(__func__, {path, options, std::move(arguments)});
 }
