@@ -1,5 +1,7 @@
 #pragma once
 
+#include <kova/string_list.h>
+
 /// Recycle bins: folders into which a deletion over the network only moves a file.
 
 #ifdef __cplusplus
@@ -10,6 +12,18 @@ extern "C" {
 int KOVAShareIsShareRecycle(const char* full_path);
 /// 1 when `full_path` lies in the recycle bin of a user's home, else 0. `auth_types` selects the kinds of users.
 int KOVARecycleUserHomePathIsExist(const char* full_path, int auth_types);
+
+/// Where accounts come from; the values may be combined to a set.
+typedef enum AUTH_TYPE {
+  AUTH_LOCAL = 1,   ///< this host's own user table
+  AUTH_DOMAIN = 2,  ///< a Windows domain
+  AUTH_LDAP = 8,    ///< a directory service
+} AUTH_TYPE;
+
+/// Append the full paths of the recycle bins that exist in the homes of users, all or those of one kind of accounts, to
+/// `*list`. 0 or more: how many; below 0 on failure. Without a share "homes" there are none.
+int KOVARecycleHomeEnumRecyclePath(KLIBCSzList** list);
+int KOVARecycleHomeEnumRecyclePathForAuthType(KLIBCSzList** list, AUTH_TYPE auth);
 
 #ifdef __cplusplus
 }

@@ -1,0 +1,30 @@
+#pragma once
+
+#include <string>
+
+#include <json/value.h>
+
+/// Which folders the notification daemon watches, and into which queues it reports. Kept on disk, so that it survives
+/// the daemon and the host's restart.
+namespace KOVA::KOVANOTIFYD {
+
+enum MonitorQueueType { MONITOR_QUEUE_TYPE_APPLICATION = 1 };
+
+/// One queue and what is watched for it: {"queue": path, "config": [{"path", "mask", "ignore": [names]}, ...]}.
+class __attribute__((visibility("default"))) MonitorQueue {
+ public:
+  explicit MonitorQueue(const Json::Value& document) : document_(document) {}
+  const Json::Value& Document() const { return document_; }
+
+  /// Registers a queue for `application`, in place of an earlier registration of the same queue, application and type.
+  /// Atomic and durable; blocks while another process changes the registry. False, with the failure recorded (see
+  /// kova/error.h) and the registry as it was, when the document is not of the form above or cannot be kept.
+  static bool Upsert(const MonitorQueue& queue, const std::string& application, int type);
+  /// Removes a registration; true also when there is none. Atomic and durable likewise.
+  static bool Delete(const std::string& queue_path, const std::string& application, int type);
+
+ private:
+  Json::Value document_;
+};
+
+}  // namespace KOVA::KOVANOTIFYD
