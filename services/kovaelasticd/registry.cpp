@@ -91,7 +91,8 @@ void Registry::Create(const std::string& id, const std::string& path, const Json
   if (known != entries_.end() && known->second->path == path) {
     Entry& entry = *known->second;
     const std::lock_guard<std::mutex> opening(entry.open_mutex);
-    if (entry.paused || IsFileExist(IndexFile(path))) return;
+    SetPaused(entry, false);
+    if (IsFileExist(IndexFile(path))) return;
     CloseEntry(entry);  // its file was removed behind our back
     MakeIndexFolder(path);
     OpenEntry(entry, path, true);
@@ -118,19 +119,19 @@ void Registry::Pause(const std::string& id) {
   const std::lock_guard<std::mutex> change(change_mutex_);
   const EntryPtr entry = Find(id);
   const std::lock_guard<std::mutex> opening(entry->open_mutex);
-  if (entry->paused) return;
   CloseEntry(*entry);
-  const std::lock_guard<std::mutex> guard(mutex_);
-  entry->paused = true;
-  Save();
+  SetPaused(*entry, true);
 }
 
 void Registry::Resume(const std::string& id) {
   const std::lock_guard<std::mutex> change(change_mutex_);
-  const EntryPtr entry = Find(id);
-  if (!entry->paused) return;
+  SetPaused(*Find(id), false);
+}
+
+void Registry::SetPaused(Entry& entry, bool paused) {
   const std::lock_guard<std::mutex> guard(mutex_);
-  entry->paused = false;
+  if (entry.paused == paused) return;
+  entry.paused = paused;
   Save();
 }
 

@@ -23,7 +23,7 @@ class Registry {
   Registry& operator=(const Registry&) = delete;
   ~Registry();
 
-  /// Makes an index in the folder `path`. An index of that id at that place stays as it is.
+  /// Makes an index in the folder `path`. An index of that id at that place keeps what is in it; it is paused no more.
   /// @throws Error kEngineIndexExists when the id or the folder is taken; kEngineBadRequest; kEngineStorage.
   void Create(const std::string& id, const std::string& path, const Json::Value& mappings);
   void Pause(const std::string& id);
@@ -70,6 +70,7 @@ class Registry {
   EntryPtr Find(const std::string& id);
   static void OpenEntry(Entry& entry, const std::string& path, bool create);
   static void CloseEntry(Entry& entry);
+  void SetPaused(Entry& entry, bool paused);
   void RefuseTaken(const std::string& id, const std::string& path, const Entry* except);
   void FinishMove(const std::string& id);
 

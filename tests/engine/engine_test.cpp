@@ -169,6 +169,9 @@ TEST_F(EngineTest, IndicesPauseMoveRenameAndGo) {
   EXPECT_EQ(Commit("a"), 1409) << "still paused";
   EXPECT_EQ(Code("index_resume", R"({"id":"a"})"), 0);
   EXPECT_EQ(Total("lantern", "a"), 1) << "pausing commits";
+  EXPECT_EQ(Code("index_pause", R"({"id":"a"})"), 0);
+  ASSERT_EQ(Create("a", "a"), 0);
+  EXPECT_EQ(Total("lantern", "a"), 1) << "what is created can be used";
   ASSERT_EQ(Put("a", "/v/3", "lantern"), 0);
   EXPECT_EQ(Code("index_config_set", R"({"id":"a","data":{"id":"b","path":")" + (folder_ / "deep/b") + "\"}}"), 0);
   EXPECT_EQ(Commit("a"), 1404);
