@@ -8,6 +8,7 @@
 #include <map>
 #include <set>
 #include <string>
+#include <tuple>
 #include <utility>
 #include <vector>
 
@@ -15,6 +16,7 @@
 
 #include <kova/error.h>
 #include <kova/fs.h>
+#include <kova/recycle.h>
 #include <kova/share.h>
 
 namespace ferrox::test {
@@ -77,11 +79,18 @@ struct FakePlatform {
   std::set<std::string> mount_points;
   /// Path prefixes (whole components).
   std::set<std::string> snapshots, recycle_bins, home_recycle_bins;
+  /// What the enumerations of home recycle bins return, in this order: full path and where the account comes from.
+  std::map<std::string, AUTH_TYPE> home_recycle_paths;
   /// KOVAACLPermGet by path; what access(2) says for others.
   std::map<std::string, int> permissions;
 
   /// Names of running services; starting and stopping changes it.
   std::set<std::string> running_services;
+  /// KOVASMBIsEnableSpotlight; KOVASMBSetSpotlight changes it.
+  int spotlight = 0;
+  /// The documents registered by MonitorQueue, by application, type and queue path. `failing` and `calls` name the
+  /// functions "MonitorQueue::Upsert" and "MonitorQueue::Delete".
+  std::map<std::tuple<std::string, int, std::string>, Json::Value> monitor_queues;
   /// Programs run by KLIBCExec and KLIBCExecl (none really runs), and their exit status.
   std::vector<FakeProgram> executed;
   int exec_status = 0;

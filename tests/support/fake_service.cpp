@@ -3,6 +3,7 @@
 #include <json/value.h>
 
 #include <kova/content_extract.h>
+#include <kova/samba.h>
 #include <kova/service.h>
 
 #include "platform/base/arguments.h"
@@ -50,6 +51,13 @@ int KLIBServicectlStop(const char* name, int kind) {
 int KLIBServiceIsRunning(const char* name) {
   if (FakeCallFails(__func__, name)) return -1;
   return static_cast<int>(FakePlatform::Get().running_services.count(name));
+}
+
+int KOVASMBIsEnableSpotlight() { return FakeCallFails(__func__, "") ? 0 : FakePlatform::Get().spotlight; }
+int KOVASMBSetSpotlight(int enable) {
+  if (FakeCallFails(__func__, std::to_string(enable))) return -1;
+  FakePlatform::Get().spotlight = enable != 0 ? 1 : 0;
+  return 0;
 }
 
 int KLIBCExec(const char* path, const char* argument, ...) {

@@ -31,6 +31,18 @@ int AnyHolds(const std::set<std::string>& folders, const std::string& path) {
   return 0;
 }
 
+/// The home recycle bins of accounts of these kinds; how many, or below 0.
+int PushHomeRecyclePaths(KLIBCSzList** list, int auth_types) {
+  if (list == nullptr || *list == nullptr) return KOVA_FAIL(KOVA_ERR_BAD_PARAMETER);
+  int count = 0;
+  for (const auto& [path, auth] : FakePlatform::Get().home_recycle_paths) {
+    if ((auth & auth_types) == 0) continue;
+    if (KLIBCSzListPush(list, path.c_str()) < 0) return -1;
+    ++count;
+  }
+  return count;
+}
+
 /// Gives out what was composed; the reason of an empty text is recorded already.
 int Give(const std::string& composed, char* buffer, size_t size) {
   return !composed.empty() && kova::CopyOut(composed, buffer, size) ? 0 : -1;
@@ -123,4 +135,11 @@ int KOVAShareIsShareRecycle(const char* full_path) {
 int KOVARecycleUserHomePathIsExist(const char* full_path, int auth_types) {
   if (FakeCallFails(__func__, std::string(full_path) + ", " + std::to_string(auth_types))) return -1;
   return AnyHolds(FakePlatform::Get().home_recycle_bins, full_path);
+}
+
+int KOVARecycleHomeEnumRecyclePath(KLIBCSzList** list) {
+  return FakeCallFails(__func__, "") ? -1 : PushHomeRecyclePaths(list, AUTH_LOCAL | AUTH_DOMAIN | AUTH_LDAP);
+}
+int KOVARecycleHomeEnumRecyclePathForAuthType(KLIBCSzList** list, AUTH_TYPE auth) {
+  return FakeCallFails(__func__, std::to_string(auth)) ? -1 : PushHomeRecyclePaths(list, auth);
 }
