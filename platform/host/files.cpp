@@ -1,6 +1,7 @@
 #include "platform/host/files.h"
 
 #include <fcntl.h>
+#include <sys/file.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -45,6 +46,12 @@ std::string Parse(const std::string& text, Json::Value& value) {
   return "is not JSON: " + errors;
 }
 
+/// O_NONBLOCK: a FIFO at the path must not hold the opener.
+int OpenLockFile(const std::string& path) {
+  if (!MakeFolders(FolderOf(path), 0755)) return -1;
+  return open(path.c_str(), O_RDWR | O_CREAT | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK, 0644);
+}
+
 bool SyncFolder(const std::string& path) {
   const Fd folder(open(path.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
   return folder.Valid() && fsync(folder.Get()) == 0;
@@ -59,6 +66,14 @@ Fd::~Fd() {
 bool Fd::Close() { return close(std::exchange(fd_, -1)) == 0; }
 
 int Fd::Release() { return std::exchange(fd_, -1); }
+
+ExclusiveLock::ExclusiveLock(const std::string& path) : file_(OpenLockFile(path)) {
+  while (!file_.Valid() || flock(file_.Get(), LOCK_EX) != 0) {
+    if (file_.Valid() && errno == EINTR) continue;
+    problem_ = errno;
+    return;
+  }
+}
 
 std::string FolderOf(const std::string& path) {
   const size_t slash = path.rfind('/');

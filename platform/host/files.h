@@ -26,6 +26,19 @@ class Fd {
   int fd_;
 };
 
+/// Holds an exclusive lock on a file, made when missing as are the folders above it, for the time of a scope. Waits
+/// while another process or thread holds it. Links are not followed, programs that are started do not inherit it.
+class ExclusiveLock {
+ public:
+  explicit ExclusiveLock(const std::string& path);
+  /// 0 when the lock is held, else why not: an error number.
+  int Problem() const { return problem_; }
+
+ private:
+  Fd file_;
+  int problem_ = 0;
+};
+
 /// The part before the last "/" ("/" for a path directly below the root) and the part after it.
 std::string FolderOf(const std::string& path);
 std::string NameOf(const std::string& path);

@@ -1,9 +1,5 @@
 #include "platform/host/share_table.h"
 
-#include <fcntl.h>
-#include <sys/file.h>
-#include <unistd.h>
-
 #include <algorithm>
 #include <cerrno>
 #include <cstring>
@@ -81,21 +77,14 @@ Json::Value ToJson(const ShareEntry& entry) {
 /// Keeps other processes from changing the table. The lock file stays.
 class TableLock {
  public:
-  TableLock() : path_(ShareTablePath() + ".lock"), file_(Open(path_)) {
-    if (!file_.Valid()) throw ShareTableError("cannot open " + path_ + ": " + strerror(errno));
-    while (flock(file_.Get(), LOCK_EX) != 0) {
-      if (errno != EINTR) throw ShareTableError("cannot lock " + path_ + ": " + strerror(errno));
+  TableLock() : lock_(ShareTablePath() + ".lock") {
+    if (lock_.Problem() != 0) {
+      throw ShareTableError("cannot lock " + ShareTablePath() + ".lock: " + strerror(lock_.Problem()));
     }
   }
 
  private:
-  static int Open(const std::string& path) {
-    if (!MakeFolders(FolderOf(path), 0755)) return -1;
-    return open(path.c_str(), O_RDWR | O_CREAT | O_CLOEXEC | O_NOFOLLOW, 0644);
-  }
-
-  std::string path_;
-  Fd file_;
+  ExclusiveLock lock_;
 };
 
 std::string TableProblem(const std::string& table_path, const std::string& problem) {
@@ -109,6 +98,30 @@ Json::Value ReadChecked() {
   Json::Value value;
   (void)ReadJsonFile(ShareTablePath(), value);
   return value.isNull() ? Json::Value(Json::arrayValue) : value;
+}
+
+/// @throws ShareTableError when the share cannot be one, whatever the table holds.
+void CheckShare(const ShareEntry& share) {
+  std::string problem = ShareTextProblem(share.name, share.path);
+  if (problem.empty()) problem = ShareFolderProblem(share);
+  if (!problem.empty()) throw ShareTableError(problem);
+}
+
+/// @throws ShareTableError when another share of the table than the one named `replaced` has the name or the path.
+void CheckBeside(const Json::Value& table, const ShareEntry& share, const std::string& replaced) {
+  for (const Json::Value& other : table) {
+    const std::string other_name = other["name"].asString(), other_path = other["path"].asString();
+    if (other_name == replaced) continue;
+    if (other_name == share.name) {
+      throw ShareTableError("there is a share \"" + share.name + "\" already, at " + other_path +
+                            "; remove it first, or give this folder another name");
+    }
+    if (other_path == share.path) throw ShareTableError(share.path + " is a share already; nothing to add");
+  }
+}
+
+[[noreturn]] void ThrowNoSuchShare(const std::string& name) {
+  throw ShareTableError("there is no share \"" + name + "\"; the list of shares names those there are");
 }
 
 void Write(const Json::Value& table) {
@@ -177,22 +190,30 @@ std::vector<ShareEntry> ListShares() {
 }
 
 void AddShare(const ShareEntry& share) {
-  std::string problem = ShareTextProblem(share.name, share.path);
-  if (problem.empty()) problem = ShareFolderProblem(share);
-  if (!problem.empty()) throw ShareTableError(problem);
+  CheckShare(share);
   const TableLock lock;
   Json::Value table = ReadChecked();
-  for (const Json::Value& other : table) {
-    const std::string other_path = other["path"].asString();
-    if (other["name"].asString() == share.name) {
-      throw ShareTableError("there is a share \"" + share.name + "\" already, at " + other_path +
-                            "; remove it first, or give this folder another name");
-    }
-    if (other_path == share.path) throw ShareTableError(share.path + " is a share already; nothing to add");
-  }
+  CheckBeside(table, share, {});
   table.append(ToJson(share));
   Write(table);
 }
+
+void RenameShare(const std::string& old_name, const std::string& new_name, const std::string& new_path) {
+  const ShareEntry renamed = {new_name, new_path};
+  CheckShare(renamed);
+  const TableLock lock;
+  Json::Value table = ReadChecked();
+  CheckBeside(table, renamed, old_name);
+  for (Json::Value& share : table) {
+    if (share["name"].asString() != old_name) continue;
+    share["name"] = new_name;
+    share["path"] = new_path;
+    return Write(table);
+  }
+  ThrowNoSuchShare(old_name);
+}
+
+void MoveShare(const std::string& name, const std::string& new_path) { RenameShare(name, name, new_path); }
 
 void RemoveShare(const std::string& name) {
   const TableLock lock;
@@ -201,9 +222,7 @@ void RemoveShare(const std::string& name) {
   for (const Json::Value& share : table) {
     if (share["name"].asString() != name) rest.append(share);
   }
-  if (rest.size() == table.size()) {
-    throw ShareTableError("there is no share \"" + name + "\"; the list of shares names those there are");
-  }
+  if (rest.size() == table.size()) ThrowNoSuchShare(name);
   Write(rest);
 }
 

@@ -44,6 +44,14 @@ std::vector<ShareEntry> ListShares();
 /// the table is then as it was.
 void AddShare(const ShareEntry& share);
 
+/// Gives a share another name, another folder or both, in one step; its other members stay. The folder under the new
+/// path must be there already. @throws ShareTableError when there is no such share, when AddShare would refuse the new
+/// name or path beside the other shares, as above.
+void RenameShare(const std::string& old_name, const std::string& new_name, const std::string& new_path);
+
+/// Gives a share another folder of the same name. @throws ShareTableError as RenameShare.
+void MoveShare(const std::string& name, const std::string& new_path);
+
 /// Takes a share out of the table; its folder stays. @throws ShareTableError when there is no such share, as above.
 void RemoveShare(const std::string& name);
 

@@ -116,6 +116,43 @@ TEST_F(HostPlatformTest, TheTableIsReadAgainWhenSomebodyElseChangesIt) {
   }
 }
 
+TEST_F(HostPlatformTest, ARenamedOrMovedShareKeepsItsFlags) {
+  kova::host::ShareEntry entry = {"photo", Folder("photo"), ".Bin"};
+  entry.hide_unreadable = true;
+  AddShare(entry);
+  AddShare({"music", Folder("music")});
+  const auto refusal = [](const string& from, const string& name, const string& path) -> string {
+    try {
+      kova::host::RenameShare(from, name, path);
+    } catch (const kova::host::ShareTableError& error) {
+      return error.what();
+    }
+    return {};
+  };
+  const struct {
+    string from, name, path, sentence;
+  } refused[] = {
+      {"gone", "x", Folder("x"), "there is no share \"gone\""},
+      {"photo", "music", Folder("other/music"), "there is a share \"music\" already"},
+      {"photo", "pictures", dir_ / "photo", "the folder " + (dir_ / "photo") + " is called \"photo\""},
+      {"photo", "pictures", dir_ / "pictures", "does not exist; make it first"},
+  };
+  const string before = ReadFile(ShareTablePath());
+  for (const auto& row : refused) {
+    const string sentence = refusal(row.from, row.name, row.path);
+    EXPECT_NE(string::npos, sentence.find(row.sentence)) << sentence;
+    EXPECT_EQ(before, ReadFile(ShareTablePath()));
+  }
+  EXPECT_EQ("", refusal("photo", "pictures", Folder("pictures")));
+  kova::host::MoveShare("pictures", Folder("v2/pictures"));
+  const auto shares = ListShares();
+  ASSERT_EQ(2U, shares.size());
+  EXPECT_EQ("pictures", shares[1].name);
+  EXPECT_EQ(dir_ / "v2/pictures", shares[1].path);
+  EXPECT_EQ(".Bin", shares[1].recycle);
+  EXPECT_TRUE(shares[1].hide_unreadable);
+}
+
 TEST_F(HostPlatformTest, ConcurrentChangesAreAllKept) {
   std::vector<std::thread> threads;
   for (int t = 0; t < 4; ++t) {
