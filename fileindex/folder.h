@@ -9,6 +9,8 @@
 
 namespace ferrox::fileindex {
 
+struct FolderLookup;
+
 /// One entry of the list of indexed folders: a folder that is chosen for indexing, and the kinds of files whose content
 /// is indexed in it. Paths are share paths ("/photo/trip"). Held through std::shared_ptr.
 class FERROX_EXPORT Folder {
@@ -59,6 +61,11 @@ class FERROX_EXPORT Folder {
   Json::Value GetDataWithAdditional(const Json::Value& additionals) const;
 
  private:
+  friend struct FolderLookup;
+
+  /// GetFullPath for who knows what comes before the share path in it.
+  const std::string& FullPathBelow(const std::string& volume) const;
+
   std::string path_;
   std::string name_;
   std::string volume_to_be_clean_;

@@ -10,13 +10,19 @@
 
 namespace ferrox::fileindex {
 
+struct FolderLookup;
+
 /// At most so many folders are indexed.
 inline constexpr unsigned int kFileIndexFoldersMax = 1000;
 
 /// The list of indexed folders, as the folders file holds it (docs/formats/folders.md). Made per use: it reads the file
 /// when made; changes are in memory until Save. Takes no lock: who changes the list holds the folder lock from before
-/// the making until after Save. An entry whose share does not exist governs nothing; it can be listed and deleted, and
-/// is named in the log once for each object. Not for several threads at once.
+/// the making until after Save. Not for several threads at once, but after a first query by full path further ones may
+/// come from several.
+///
+/// An entry whose share does not exist, or whose path does not begin with "/", governs nothing; it can be listed and
+/// deleted, and is named in the log once for each object. Queries by full path, the first one of an object asking the
+/// platform for each share, throw kNoSuchShare when the platform cannot tell: "not indexed" means just that.
 ///
 /// A "change" is a Folder with the path and name of the entry concerned and the kinds set whose indexing changed.
 class FERROX_EXPORT FolderMgr {
@@ -70,11 +76,11 @@ class FERROX_EXPORT FolderMgr {
   std::set<std::string> GetIndexedShares() const;
 
  private:
-  struct Lookup;
-  const Lookup& ByFullPath() const;
+  FolderLookup& ByFullPath() const;
+  void Remove(const std::string& path, const std::string& full_path);
 
   std::vector<std::shared_ptr<Folder>> folders_;
-  mutable std::unique_ptr<Lookup> lookup_;
+  mutable std::unique_ptr<FolderLookup> lookup_;
 };
 
 }  // namespace ferrox::fileindex

@@ -8,6 +8,7 @@
 #include "common/log.h"
 #include "common/new_class.h"
 #include "fileindex/event_line_reader.h"
+#include "fileindex/folder_mgr.h"
 #include "fileindex/op_path.h"
 #include "fileindex/optree.h"
 
@@ -46,6 +47,8 @@ int QueueMgr::ProcessOP(const std::function<void(std::shared_ptr<OP>)>& fn, bool
 }
 
 bool QueueMgr::IsFullPathProcessing(const std::string& full_path) {
+  // Folders that cannot be loaded count as a failure here; otherwise they have no say.
+  const FolderMgr folder_mgr;
   const auto touches = [&full_path](const std::shared_ptr<Event>& event) {
     return IsAtOrBelow(event->path, full_path) || IsAtOrBelow(event->path_old, full_path);
   };
