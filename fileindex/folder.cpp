@@ -1,6 +1,7 @@
 #include "fileindex/folder.h"
 
 #include "common/json_util.h"
+#include "fileindex/folder_status.h"
 #include "fileindex/queue_mgr.h"
 #include "fileindex/util.h"
 #include "sdk/share.h"
@@ -78,6 +79,12 @@ Json::Value Folder::GetIndexCfg() const {
 bool Folder::IsIndexing() const {
   const sdk::SDKShare share(GetShare());
   return QueueMgr(share.GetQueuePath()).IsFullPathProcessing(GetFullPath());
+}
+
+void Folder::GetStatus(Json::Value& out) const { FolderStatus(*this).GetStatus(out, *this); }
+
+Json::Value Folder::GetDataWithAdditional(const Json::Value& additionals) const {
+  return FolderStatus(*this).GetDataWithAdditional(*this, additionals);
 }
 
 }  // namespace ferrox::fileindex

@@ -9,6 +9,7 @@
 
 namespace ferrox::fileindex {
 
+class FolderStatus;
 struct FolderLookup;
 
 /// One entry of the list of indexed folders: a folder that is chosen for indexing, and the kinds of files whose content
@@ -61,6 +62,7 @@ class FERROX_EXPORT Folder {
   Json::Value GetDataWithAdditional(const Json::Value& additionals) const;
 
  private:
+  friend class FolderStatus;
   friend struct FolderLookup;
 
   /// GetFullPath for who knows what comes before the share path in it.

@@ -52,14 +52,18 @@ bool QueueMgr::IsFullPathProcessing(const std::string& full_path) {
   const auto touches = [&full_path](const std::shared_ptr<Event>& event) {
     return IsAtOrBelow(event->path, full_path) || IsAtOrBelow(event->path_old, full_path);
   };
-  return FindQueue(touches, queue_path_) || FindQueue(touches, queue_path_tmp_);
+  return FindQueues(touches);
 }
 
 bool QueueMgr::IsFullPathHasReindex(const std::string& full_path) {
   const auto covers = [&full_path](const std::shared_ptr<Event>& event) {
     return event->event == EVENT_REINDEX && IsAtOrBelow(full_path, event->path);
   };
-  return FindQueue(covers, queue_path_) || FindQueue(covers, queue_path_tmp_);
+  return FindQueues(covers);
+}
+
+bool QueueMgr::FindQueues(const std::function<bool(std::shared_ptr<Event>)>& pred) const {
+  return FindQueue(pred, queue_path_) || FindQueue(pred, queue_path_tmp_);
 }
 
 bool QueueMgr::FindQueue(const std::function<bool(std::shared_ptr<Event>)>& pred, const std::string& path) {

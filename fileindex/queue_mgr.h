@@ -11,6 +11,7 @@ namespace ferrox::fileindex {
 struct Event;
 struct OP;
 class OPTree;
+class QueueScan;
 
 /// One share's event queue file and its processing copy. Writers append to the live queue; a reader detaches it by a
 /// rename to its ".tmp" name, works through that, and deletes it. At most one detached queue exists at a time. Missing
@@ -47,7 +48,10 @@ class FERROX_EXPORT QueueMgr {
   bool IsFullPathHasReindex(const std::string& full_path);
 
  private:
+  friend class QueueScan;
+
   static bool FindQueue(const std::function<bool(std::shared_ptr<Event>)>& pred, const std::string& path);
+  bool FindQueues(const std::function<bool(std::shared_ptr<Event>)>& pred) const;
 
   std::string queue_path_;
   std::string queue_path_tmp_;

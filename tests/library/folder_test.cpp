@@ -1,15 +1,55 @@
 #include "fileindex/folder.h"
 
+#include "common/new_class.h"
+#include "fileindex/folder_mgr.h"
+#include "fileindex/folder_status.h"
+#include "fileindex/status_mgr.h"
+#include "fileindex/util.h"
+#include "sdk/share.h"
 #include "tests/support/library_test.h"
+#include "tests/support/queue_lines.h"
 
 namespace ferrox::fileindex {
 
 namespace {
 
+namespace fs = std::filesystem;
 using test::FailureOf;
 using test::Parse;
+using FolderPtr = std::shared_ptr<Folder>;
 
-class FolderTest : public test::LibraryTest {};
+FolderPtr NewFolder(const std::string& path) {
+  return newClass<Folder>(path, "n", true, true, true, true, false, false);
+}
+
+class FolderTest : public test::LibraryTest {
+ protected:
+  /// Two shares with folders that are there.
+  void SetUp() override {
+    fs::remove(InstancePath(kFileIndexFoldersCfgPath));
+    fs::remove(InstancePath(kFileIndexStatusCfgPath));
+    for (const char* share : {"photo", "music"}) {
+      platform_.shares[share].path = volume_ / share;
+      for (const char* folder : {"/a/b", "/ab", "/c"}) fs::create_directories(volume_ / (share + std::string(folder)));
+      queue_[share] = sdk::SDKShare(share).GetQueuePath();
+      fs::remove(queue_[share]);
+      fs::remove(queue_[share] + ".tmp");
+    }
+  }
+  /// What the folder is told: its status, or the failure.
+  static std::string Told(FolderStatus& status, const Folder& folder) {
+    Json::Value out;
+    const std::string failure = FailureOf([&] { status.GetStatus(out, folder); });
+    return failure.empty() ? out["text"].asString() + out["desc"].asString() : failure;
+  }
+  static std::string Told(const Folder& folder) {
+    FolderStatus status(folder);
+    return Told(status, folder);
+  }
+
+  const test::TempDir volume_;
+  std::map<std::string, std::string> queue_;
+};
 
 constexpr char kStored[] = R"({"audio":true,"document":false,"name":"n","path":"/photo/a","paused":false,"photo":true,)"
                            R"("privileged":false,"video":false,"volume_to_be_clean":""})";
@@ -57,6 +97,96 @@ TEST_F(FolderTest, FollowsItsShare) {
   EXPECT_EQ(FailureOf([&folder] { folder.SetShare("new"); }), "120 ");
   folder.SetPath("/gone");
   EXPECT_EQ(FailureOf([&folder] { (void)folder.GetFullPath(); }), "800 gone");
+}
+
+TEST_F(FolderTest, StatusFollowsTheOrderOfItsQuestions) {
+  const Folder folder = *NewFolder("/photo/a");
+  EXPECT_EQ(Told(folder), "finished");
+  test::WriteQueue(queue_["photo"], {test::Create(volume_ / "photo/a/x")});
+  EXPECT_TRUE(folder.IsIndexing());
+  struct Row {
+    const char *status, *text;
+  };
+  for (const Row& row :
+       {Row{"{}", "processing"}, Row{R"({"resume_time":-1})", "processing"}, Row{R"({"resume_time":0})", "paused"},
+        Row{R"({"resume_time":1700000001})", "paused"}, Row{R"({"resume_time":1700000000})", "processing"},
+        Row{R"({"share":{"photo":3}})", "need_reindex"}, Row{R"({"share":{"photo":2,"music":1}})", "processing"}}) {
+    test::WriteFile(InstancePath(kFileIndexStatusCfgPath), row.status);
+    EXPECT_EQ(Told(folder), row.text) << row.status;
+  }
+  test::WriteFile(InstancePath(kFileIndexFoldersCfgPath), "{");
+  EXPECT_EQ(Told(folder).substr(0, 3), "504") << "the queue is read with the folders at hand";
+  test::WriteFile(InstancePath(kFileIndexStatusCfgPath), R"({"share":{"photo":1}})");
+  EXPECT_EQ(Told(folder), "need_reindex");
+  EXPECT_EQ(Told(*NewFolder("/photo/../photo/a")), "errorinvalid_path");
+  EXPECT_EQ(Told(*NewFolder("/gone/a")), "800 gone");
+  EXPECT_EQ(Told(*NewFolder("photo")), "120 ");
+  test::WriteFile(InstancePath(kFileIndexStatusCfgPath), "[");
+  EXPECT_EQ(Told(*NewFolder("photo")).substr(0, 3), "504");
+}
+
+TEST_F(FolderTest, AdditionalBlocksAreAskedForByName) {
+  const FolderPtr folder = NewFolder("/photo/a");
+  Json::Value expected = folder->GetData();
+  EXPECT_EQ(folder->GetDataWithAdditional(Parse("[]")), expected);
+  expected["additional"]["status"]["text"] = "finished";
+  EXPECT_EQ(folder->GetDataWithAdditional(Parse(R"(["status","status"])")), expected);
+  struct Row {
+    const char *additionals, *failure, *logged;
+  };
+  for (const Row& row : {Row{R"({"a":1})", R"(120 {"a":1})", R"([!addiitionals.isArray()], reason: {"a":1})"},
+                         Row{R"(["status",7])", "120 7", "(GetDataWithAdditional) Failed [!it.isString()], reason: 7"},
+                         Row{R"(["size"])", "120 Unknown additioal: size", ""}}) {
+    log_.Lines().clear();
+    EXPECT_EQ(FailureOf([&] { (void)folder->GetDataWithAdditional(Parse(row.additionals)); }), row.failure);
+    EXPECT_EQ(log_.Contains(row.logged), *row.logged != 0) << row.additionals;
+  }
+}
+
+// Each folder of a listing is told what it would be told alone, whatever is wrong with the others.
+TEST_F(FolderTest, ManyAreToldWhatOneIsTold) {
+  std::vector<FolderPtr> folders;
+  for (const char* path : {"/photo", "/photo/a", "/photo/a/b", "/photo/ab", "/photo/a", "/photo/none", "/music/a",
+                           "/music/a/b", "/music/c", "/gone/a", "/gone/b", "gone"}) {
+    folders.push_back(NewFolder(path));
+  }
+  using Lines = std::vector<std::string>;
+  const std::string photo = volume_ / "photo";
+  for (const auto& [live, detached] :
+       {std::pair<Lines, Lines>{},
+        {{test::Create(photo + "/a/x")}, {}},
+        {{test::Modify(photo + "/abc")}, {"bad"}},
+        {{test::Rename(photo + "/a/b", volume_ / "music/c/x")}, {test::Create(photo + "/ab")}},
+        {{test::Create(photo + "/a"), "bad", test::Create(photo + "/ab")}, {test::Create(photo + "/ab")}},
+        {{"{}"}, {}}}) {
+    for (const char* share : {"photo", "music"}) {
+      test::WriteQueue(queue_[share], live);
+      test::WriteQueue(queue_[share] + ".tmp", detached);
+    }
+    FolderStatus together(folders);
+    for (const FolderPtr& folder : folders) {
+      SCOPED_TRACE(folder->GetPath());
+      const std::string told = Told(together, *folder);
+      EXPECT_EQ(told, Told(*NewFolder(folder->GetPath())));
+      if (told == "finished" || told == "processing") {
+        EXPECT_EQ(folder->IsIndexing(), told == "processing");
+      } else if (told.find("event_raw") != std::string::npos || told.find("Missing property") != std::string::npos) {
+        EXPECT_EQ(FailureOf([&folder] { (void)folder->IsIndexing(); }), told);
+      }
+    }
+  }
+}
+
+TEST_F(FolderTest, WhatFoldersShareIsReadOnce) {
+  std::vector<FolderPtr> folders;
+  for (int i = 0; i < 20; ++i) folders.push_back(NewFolder(i % 2 == 0 ? "/photo/a" : "/gone/" + std::to_string(i)));
+  test::WriteQueue(queue_["photo"], {"bad"});
+  platform_.calls.clear();
+  log_.Lines().clear();
+  FolderStatus status(folders);
+  for (const FolderPtr& folder : folders) (void)Told(status, *folder);
+  EXPECT_EQ(platform_.CallCount("FILEIDXQueuePathCompose"), 1);
+  EXPECT_EQ(log_.Lines().size(), 2U) << "the bad line and the share that is gone";
 }
 
 }  // namespace ferrox::fileindex

@@ -1,0 +1,33 @@
+#pragma once
+
+#include <memory>
+#include <optional>
+#include <utility>
+
+#include "common/error.h"
+
+namespace ferrox::fileindex {
+
+/// Something that is made when it is first needed, and then kept. So is the Error that its making threw.
+template <typename T>
+class Memo {
+ public:
+  /// What is kept, else what `make` returns, a std::unique_ptr. @throws Error as `make` did.
+  template <typename Make>
+  T& Get(const Make& make) {
+    if (failure_) throw Error(*failure_);  // logged when it arose
+    try {
+      if (value_ == nullptr) value_ = make();
+    } catch (const Error& error) {
+      failure_ = error;
+      throw;
+    }
+    return *value_;
+  }
+
+ private:
+  std::unique_ptr<T> value_;
+  std::optional<Error> failure_;
+};
+
+}  // namespace ferrox::fileindex
