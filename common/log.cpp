@@ -9,7 +9,8 @@
 #include <cstdarg>
 #include <cstdio>
 #include <cstring>
-#include <string_view>
+
+#include <kova/log.h>
 
 namespace ferrox {
 
@@ -21,22 +22,6 @@ void SystemSink(int priority, const char* line) { syslog(priority, "%s", line); 
 
 std::atomic<LogSink> g_sink{&SystemSink};
 
-std::string WithoutControlCharacters(std::string_view text) {
-  std::string out;
-  out.reserve(text.size());
-  for (const char c : text) {
-    const auto byte = static_cast<unsigned char>(c);
-    if (byte >= 0x20 && byte != 0x7f) {
-      out += c;
-    } else {
-      char escaped[5];
-      (void)snprintf(escaped, sizeof(escaped), "\\x%02x", static_cast<unsigned>(byte));
-      out += escaped;
-    }
-  }
-  return out;
-}
-
 }  // namespace
 
 void Log(int priority, const char* format, ...) {
@@ -47,7 +32,7 @@ void Log(int priority, const char* format, ...) {
   const int length = vsnprintf(line, sizeof(line), format, arguments);
   va_end(arguments);
   const size_t used = length < 0 ? 0 : std::min(static_cast<size_t>(length), sizeof(line) - 1);
-  g_sink.load()(priority, WithoutControlCharacters({line, used}).c_str());
+  g_sink.load()(priority, kova::WithoutControlCharacters({line, used}).c_str());
   errno = saved_errno;
 }
 

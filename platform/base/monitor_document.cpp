@@ -6,10 +6,12 @@ namespace kova {
 
 namespace {
 
+/// Without a trailing slash: a path has one form only.
 bool IsAbsolutePath(const Json::Value& value) {
   if (!value.isString()) return false;
   const std::string path = value.asString();
-  return path.size() > 1 && path.size() < PATH_MAX && path.front() == '/' && path.find('\0') == std::string::npos;
+  return path.size() > 1 && path.size() < PATH_MAX && path.front() == '/' && path.back() != '/' &&
+         path.find('\0') == std::string::npos;
 }
 
 /// One component of a path.

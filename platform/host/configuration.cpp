@@ -1,38 +1,55 @@
 #include "platform/host/configuration.h"
 
+#include <syslog.h>
+
 #include <json/value.h>
 
 #include <kova/instance.h>
 
-#include "platform/base/failure.h"
 #include "platform/host/files.h"
+#include "platform/host/json_members.h"
+#include "platform/host/log.h"
 #include "platform/host/stat_cache.h"
 
 namespace kova::host {
 
 namespace {
 
+/// An absolute path.
+bool ReadPath(const Json::Value& object, const char* key, std::string& out) {
+  return ReadMember(object, key, out) && (!object.isMember(key) || out.compare(0, 1, "/") == 0);
+}
+
+bool ReadSamba(const Json::Value& object, Configuration::Samba& samba) {
+  return object.isObject() && ReadMember(object, "shares", samba.shares) && ReadPath(object, "config", samba.config) &&
+         ReadPath(object, "testparm", samba.testparm) && ReadPath(object, "smbcontrol", samba.smbcontrol);
+}
+
 Configuration Load(const std::string& path) {
   Configuration configuration;
+  configuration.samba.config = InstanceRoot() + "/etc/samba/smb.conf";
+  if (InstanceRoot().empty()) configuration.samba.smbcontrol = "/usr/bin/smbcontrol";
   Json::Value value;
   configuration.problem = ReadJsonFile(path, value);
   if (!configuration.problem.empty() || value.isNull()) return configuration;
-  if (!value.isObject() || (value.isMember("admin_group") && !value["admin_group"].isString())) {
-    configuration.problem = "is not an object of settings";
-  } else if (value.isMember("admin_group")) {
-    configuration.admin_group = value["admin_group"].asString();
-  }
+  const bool read = value.isObject() && ReadMember(value, "admin_group", configuration.admin_group) &&
+                    (!value.isMember("samba") || ReadSamba(value["samba"], configuration.samba));
+  if (!read) configuration.problem = "is not an object of settings, or one has the wrong type";
   return configuration;
 }
 
 }  // namespace
 
-bool GetConfiguration(Configuration& configuration) {
+std::shared_ptr<const Configuration> GetConfiguration() {
   static auto* cache = new StatCache<Configuration>;  // never freed, like the share table
-  configuration = *cache->Get(InstanceRoot() + "/etc/kova/kova.json", &Load);
-  if (configuration.problem.empty()) return true;
-  (void)KOVA_FAIL(KOVA_ERR_BAD_CONFIGURATION);
-  return false;
+  const std::string path = InstanceRoot() + "/etc/kova/kova.json";
+  std::shared_ptr<const Configuration> configuration = cache->Get(path, &Load);
+  if (!configuration->problem.empty()) {
+    LogChange(LOG_ERR, path,
+              "the settings " + path + " cannot be used: the file " + configuration->problem +
+                  "; correct it, or move it away to have the usual ones");
+  }
+  return configuration;
 }
 
 }  // namespace kova::host

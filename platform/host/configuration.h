@@ -1,18 +1,26 @@
 #pragma once
 
+#include <memory>
 #include <string>
 
 /// What the host's administrator may set: the JSON object in "/etc/kova/kova.json" below the instance's root.
-///   {"admin_group": "sudo"}
+///   {"admin_group": "sudo", "samba": {"shares": true}}
 namespace kova::host {
 
 struct Configuration {
   std::string admin_group = "sudo";  ///< its members are administrators, beside root
+  struct Samba {
+    std::string config;                          ///< its configuration's text
+    bool shares = false;                         ///< whether its shares are shares here
+    std::string testparm = "/usr/bin/testparm";  ///< what tells them
+    /// What reaches its running processes; empty in an instance that is not the host's own, unless it is set.
+    std::string smbcontrol;
+  } samba = {};
   std::string problem = {};
 };
 
-/// The present configuration, re-read when its file has changed. False, with the failure recorded, when the file cannot
-/// be used; a missing one is a configuration of defaults.
-bool GetConfiguration(Configuration& configuration);
+/// The present configuration, re-read when its file has changed; a missing file is a configuration of defaults.
+/// `problem` tells why the file cannot be used, which is logged.
+std::shared_ptr<const Configuration> GetConfiguration();
 
 }  // namespace kova::host

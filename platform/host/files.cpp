@@ -18,15 +18,13 @@ namespace kova::host {
 
 namespace {
 
-constexpr off_t kJsonMaxBytes = 16 << 20;
-
 bool ReadAll(int fd, std::string& text) {
   char buffer[16384];
   for (;;) {
     const ssize_t got = read(fd, buffer, sizeof(buffer));
     if (got == 0) return true;
     if (got < 0 && errno == EINTR) continue;
-    if (got < 0 || static_cast<off_t>(text.size()) > kJsonMaxBytes) return false;
+    if (got < 0 || text.size() > kFileMaxBytes) return false;
     text.append(buffer, static_cast<size_t>(got));
   }
 }
@@ -50,6 +48,14 @@ std::string Parse(const std::string& text, Json::Value& value) {
 int OpenLockFile(const std::string& path) {
   if (!MakeFolders(FolderOf(path), 0755)) return -1;
   return open(path.c_str(), O_RDWR | O_CREAT | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK, 0644);
+}
+
+/// Gives an open file the owner and the mode of `like`; chown takes bits of the mode away and goes first.
+bool Dress(int fd, const struct stat& like) {
+  struct stat now = {};
+  if (fstat(fd, &now) != 0) return false;
+  const bool owned = now.st_uid == like.st_uid && now.st_gid == like.st_gid;
+  return (owned || fchown(fd, like.st_uid, like.st_gid) == 0) && fchmod(fd, like.st_mode & 07777) == 0;
 }
 
 bool SyncFolder(const std::string& path) {
@@ -84,19 +90,29 @@ std::string FolderOf(const std::string& path) {
 std::string NameOf(const std::string& path) { return path.substr(path.rfind('/') + 1); }
 
 bool MakeFolders(const std::string& path, mode_t mode) {
-  if (path.empty() || mkdir(path.c_str(), mode) == 0 || errno == EEXIST) return true;
-  return errno == ENOENT && MakeFolders(FolderOf(path), mode) && (mkdir(path.c_str(), mode) == 0 || errno == EEXIST);
+  if (path.empty()) return true;
+  bool made = mkdir(path.c_str(), mode) == 0;
+  if (!made && errno == ENOENT) made = MakeFolders(FolderOf(path), mode) && mkdir(path.c_str(), mode) == 0;
+  return made ? SyncFolder(FolderOf(path)) : errno == EEXIST;
+}
+
+std::string ReadTextFile(const std::string& path, std::string& text, struct stat* info) {
+  struct stat own = {};
+  if (info == nullptr) info = &own;
+  *info = {};
+  text.clear();
+  const Fd file(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK));
+  if (!file.Valid()) return errno == ENOENT ? std::string() : std::string("cannot be read: ") + strerror(errno);
+  if (fstat(file.Get(), info) != 0 || !S_ISREG(info->st_mode)) return "is not a regular file";
+  return ReadAll(file.Get(), text) ? std::string() : "cannot be read whole";
 }
 
 std::string ReadJsonFile(const std::string& path, Json::Value& value) {
   value = Json::Value();
-  const Fd file(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK));
-  if (!file.Valid()) return errno == ENOENT ? std::string() : std::string("cannot be read: ") + strerror(errno);
-  struct stat info = {};
-  if (fstat(file.Get(), &info) != 0 || !S_ISREG(info.st_mode)) return "is not a regular file";
   std::string text;
-  if (!ReadAll(file.Get(), text)) return "cannot be read whole";
-  return Parse(text, value);
+  struct stat info = {};
+  const std::string problem = ReadTextFile(path, text, &info);
+  return !problem.empty() || info.st_ino == 0 ? problem : Parse(text, value);
 }
 
 bool WriteAll(int fd, const char* data, size_t size) {
@@ -111,10 +127,18 @@ bool WriteAll(int fd, const char* data, size_t size) {
 }
 
 bool ReplaceFile(const std::string& path, const std::string& content, mode_t mode) {
+  struct stat like = {};
+  like.st_mode = mode;
+  like.st_uid = geteuid();
+  like.st_gid = getegid();
+  return ReplaceFile(path, content, like);
+}
+
+bool ReplaceFile(const std::string& path, const std::string& content, const struct stat& like) {
   std::string temporary = path + ".XXXXXX";
   Fd file(mkostemp(temporary.data(), O_CLOEXEC));
   if (!file.Valid()) return false;
-  const bool replaced = WriteAll(file.Get(), content.data(), content.size()) && fchmod(file.Get(), mode) == 0 &&
+  const bool replaced = WriteAll(file.Get(), content.data(), content.size()) && Dress(file.Get(), like) &&
                         fsync(file.Get()) == 0 && file.Close() && rename(temporary.c_str(), path.c_str()) == 0;
   if (replaced) return SyncFolder(FolderOf(path));
   const int saved_errno = errno;
@@ -122,5 +146,7 @@ bool ReplaceFile(const std::string& path, const std::string& content, mode_t mod
   errno = saved_errno;
   return false;
 }
+
+bool RemoveFile(const std::string& path) { return unlink(path.c_str()) == 0 && SyncFolder(FolderOf(path)); }
 
 }  // namespace kova::host

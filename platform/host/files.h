@@ -1,5 +1,6 @@
 #pragma once
 
+#include <sys/stat.h>
 #include <sys/types.h>
 
 #include <string>
@@ -43,15 +44,27 @@ class ExclusiveLock {
 std::string FolderOf(const std::string& path);
 std::string NameOf(const std::string& path);
 
-/// Makes a folder and those above it; true when it exists afterwards.
+/// Makes a folder and those above it, each durably; true when it exists afterwards.
 bool MakeFolders(const std::string& path, mode_t mode);
 
-/// Reads a JSON file of at most 16 MiB. A missing file is an empty value and no problem. Returns what is wrong with the
-/// file, or an empty text.
+/// The largest file that is read whole.
+constexpr size_t kFileMaxBytes = 16 << 20;
+
+/// Reads a regular file of at most that size. `info`, when not null, is filled with what the text was read from; st_ino
+/// 0 tells a missing file, which is an empty text and no problem. Returns what is wrong with the file, or an empty
+/// text.
+std::string ReadTextFile(const std::string& path, std::string& text, struct stat* info = nullptr);
+
+/// The same for a JSON file. A missing file is an empty value.
 std::string ReadJsonFile(const std::string& path, Json::Value& value);
 
 /// Replaces a file whole: written beside it, synced, renamed over it, the folder synced. False, with errno, on failure.
 bool ReplaceFile(const std::string& path, const std::string& content, mode_t mode);
+/// The same, with the mode and the owner of `like`.
+bool ReplaceFile(const std::string& path, const std::string& content, const struct stat& like);
+
+/// Removes a file durably. False, with errno, on failure.
+bool RemoveFile(const std::string& path);
 
 bool WriteAll(int fd, const char* data, size_t size);
 

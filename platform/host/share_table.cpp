@@ -1,8 +1,11 @@
 #include "platform/host/share_table.h"
 
+#include <syslog.h>
+
 #include <algorithm>
 #include <cerrno>
 #include <cstring>
+#include <mutex>
 
 #include <json/value.h>
 #include <json/writer.h>
@@ -12,6 +15,9 @@
 
 #include "platform/base/failure.h"
 #include "platform/host/files.h"
+#include "platform/host/json_members.h"
+#include "platform/host/log.h"
+#include "platform/host/samba_shares.h"
 #include "platform/host/share_rules.h"
 #include "platform/host/stat_cache.h"
 
@@ -24,36 +30,14 @@ StatCache<ShareTable>& Cache() {
   return *cache;
 }
 
-/// Reads a member; false when it is there with another type.
-bool Read(const Json::Value& object, const char* key, bool& out) {
-  if (!object.isMember(key)) return true;
-  if (!object[key].isBool()) return false;
-  out = object[key].asBool();
-  return true;
-}
-
-bool Read(const Json::Value& object, const char* key, std::string& out) {
-  if (!object.isMember(key)) return true;
-  if (!object[key].isString()) return false;
-  out = object[key].asString();
-  return true;
-}
-
-bool Read(const Json::Value& object, const char* key, uint32_t& out) {
-  if (!object.isMember(key)) return true;
-  if (!object[key].isUInt()) return false;
-  out = object[key].asUInt();
-  return true;
-}
-
 /// What is wrong with one element of the table; empty when it was read.
 std::string ReadEntry(const Json::Value& object, ShareEntry& entry) {
   if (!object.isObject()) return "is not an object";
-  const bool read = Read(object, "name", entry.name) && Read(object, "path", entry.path) &&
-                    Read(object, "recycle", entry.recycle) && Read(object, "encrypted", entry.encrypted) &&
-                    Read(object, "locked", entry.locked) && Read(object, "read_only", entry.read_only) &&
-                    Read(object, "hide_unreadable", entry.hide_unreadable) &&
-                    Read(object, "ftp_privilege", entry.ftp_privilege);
+  const bool read = ReadMember(object, "name", entry.name) && ReadMember(object, "path", entry.path) &&
+                    ReadMember(object, "recycle", entry.recycle) && ReadMember(object, "encrypted", entry.encrypted) &&
+                    ReadMember(object, "locked", entry.locked) && ReadMember(object, "read_only", entry.read_only) &&
+                    ReadMember(object, "hide_unreadable", entry.hide_unreadable) &&
+                    ReadMember(object, "ftp_privilege", entry.ftp_privilege);
   if (!read) return "has a member of the wrong type";
   while (entry.path.size() > 1 && entry.path.back() == '/') entry.path.pop_back();
   const std::string problem = ShareTextProblem(entry.name, entry.path);
@@ -120,7 +104,30 @@ void CheckBeside(const Json::Value& table, const ShareEntry& share, const std::s
   }
 }
 
+/// The table and Samba's shares as one, made anew when one of them is.
+std::shared_ptr<const ShareTable> WithSamba(const std::shared_ptr<const ShareTable>& own) {
+  struct Made {
+    std::mutex mutex;
+    std::shared_ptr<const ShareTable> own, both;
+    std::shared_ptr<const std::vector<ShareEntry>> samba;
+  };
+  static auto* made = new Made;  // never freed, like the table
+  const std::shared_ptr<const std::vector<ShareEntry>> samba = SambaShares();
+  if (samba == nullptr || !own->Problem().empty()) return own;
+  const std::lock_guard<std::mutex> guard(made->mutex);
+  if (made->own != own || made->samba != samba) {
+    made->both = std::make_shared<const ShareTable>(own->With(*samba));
+    made->own = own;
+    made->samba = samba;
+  }
+  return made->both;
+}
+
 [[noreturn]] void ThrowNoSuchShare(const std::string& name) {
+  const std::shared_ptr<const std::vector<ShareEntry>> samba = SambaShares();
+  const bool sambas = samba != nullptr && std::any_of(samba->begin(), samba->end(),
+                                                      [&](const ShareEntry& share) { return share.name == name; });
+  if (sambas) throw ShareTableError("share \"" + name + "\" stands in Samba's configuration; change it there");
   throw ShareTableError("there is no share \"" + name + "\"; the list of shares names those there are");
 }
 
@@ -148,13 +155,7 @@ ShareTable ShareTable::Load(const std::string& table_path) {
     if (!problem.empty()) problem = "has an entry (number " + std::to_string(i + 1) + ") that " + problem;
     table.entries_.push_back(std::move(entry));
   }
-  std::sort(table.entries_.begin(), table.entries_.end(),
-            [](const ShareEntry& a, const ShareEntry& b) { return a.name < b.name; });
-  for (size_t i = 0; problem.empty() && i < table.entries_.size(); ++i) {
-    const ShareEntry& entry = table.entries_[i];
-    if (!table.by_name_.emplace(entry.name, i).second) problem = "has two shares named \"" + entry.name + "\"";
-    if (!table.by_path_.emplace(entry.path, i).second) problem = "has two shares at " + entry.path;
-  }
+  if (problem.empty()) problem = table.BuildIndex();
   if (!problem.empty()) {
     table = ShareTable();
     table.problem_ = TableProblem(table_path, problem);
@@ -162,8 +163,37 @@ ShareTable ShareTable::Load(const std::string& table_path) {
   return table;
 }
 
+std::string ShareTable::BuildIndex() {
+  std::sort(entries_.begin(), entries_.end(), [](const ShareEntry& a, const ShareEntry& b) { return a.name < b.name; });
+  by_name_.clear();
+  by_path_.clear();
+  for (size_t i = 0; i < entries_.size(); ++i) {
+    const ShareEntry& entry = entries_[i];
+    if (!by_name_.emplace(entry.name, i).second) return "has two shares named \"" + entry.name + "\"";
+    if (!by_path_.emplace(entry.path, i).second) return "has two shares at " + entry.path;
+  }
+  return {};
+}
+
+ShareTable ShareTable::With(const std::vector<ShareEntry>& samba) const {
+  ShareTable both = *this;
+  for (const ShareEntry& entry : samba) {
+    const ShareEntry* own = ByName(entry.name);
+    if (own == nullptr) {
+      both.entries_.push_back(entry);
+      both.entries_.back().from_samba = true;
+    } else if (own->path != entry.path) {
+      LogChange(LOG_WARNING, "share " + entry.name,
+                "share \"" + entry.name + "\" is at " + own->path + " by " + ShareTablePath() + " and at " +
+                    entry.path + " by Samba's configuration: the first counts");
+    }
+  }
+  (void)both.BuildIndex();  // a share's path ends in its name: with the names the paths differ too
+  return both;
+}
+
 std::shared_ptr<const ShareTable> ShareTable::Current() {
-  std::shared_ptr<const ShareTable> table = Cache().Get(ShareTablePath(), &ShareTable::Load);
+  std::shared_ptr<const ShareTable> table = WithSamba(Cache().Get(ShareTablePath(), &ShareTable::Load));
   if (table->Problem().empty()) return table;
   (void)KOVA_FAIL(KOVA_ERR_BAD_CONFIGURATION);
   return nullptr;
@@ -184,7 +214,7 @@ const ShareEntry* ShareTable::ByFullPath(const std::string& full_path) const {
 }
 
 std::vector<ShareEntry> ListShares() {
-  const std::shared_ptr<const ShareTable> table = Cache().Get(ShareTablePath(), &ShareTable::Load);
+  const std::shared_ptr<const ShareTable> table = WithSamba(Cache().Get(ShareTablePath(), &ShareTable::Load));
   if (!table->Problem().empty()) throw ShareTableError(table->Problem());
   return table->Entries();
 }

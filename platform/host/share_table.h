@@ -25,6 +25,7 @@ struct ShareEntry {
   bool read_only = false;
   bool hide_unreadable = false;
   uint32_t ftp_privilege = 2;
+  bool from_samba = false;  ///< not of the table: Samba's configuration tells of it
 };
 
 /// What is wrong, as one sentence that says what to do.
@@ -36,7 +37,8 @@ class __attribute__((visibility("default"))) ShareTableError : public std::runti
 /// Where the table of this instance is.
 std::string ShareTablePath();
 
-/// All shares in ascending order of their names. @throws ShareTableError when the table cannot be used.
+/// All shares in ascending order of their names, Samba's among them where the host's configuration asks for them; a
+/// share of the table hides Samba's of the same name. @throws ShareTableError when the table cannot be used.
 std::vector<ShareEntry> ListShares();
 
 /// Adds a share. Shares may lie in one another: the deepest one then owns a path. Blocks while another process changes
@@ -58,7 +60,8 @@ void RemoveShare(const std::string& name);
 /// The table in memory, for the platform's own look-ups.
 class ShareTable {
  public:
-  /// The present table, re-read when its file has changed; null, with the failure recorded, when it cannot be used.
+  /// The present table with Samba's shares, re-read when one of their files has changed; null, with the failure
+  /// recorded, when the table cannot be used.
   static std::shared_ptr<const ShareTable> Current();
 
   const std::vector<ShareEntry>& Entries() const { return entries_; }
@@ -68,8 +71,13 @@ class ShareTable {
   const std::string& Problem() const { return problem_; }
 
   static ShareTable Load(const std::string& table_path);
+  /// The table with those of `samba` that it has not itself.
+  ShareTable With(const std::vector<ShareEntry>& samba) const;
 
  private:
+  /// Sorts the entries and finds them by name and path. What is wrong, or an empty text.
+  std::string BuildIndex();
+
   std::vector<ShareEntry> entries_;
   std::unordered_map<std::string, size_t> by_name_;
   std::unordered_map<std::string, size_t> by_path_;

@@ -9,6 +9,13 @@
 
 namespace kova::host {
 
+/// Whether two looks saw the same file with the same content.
+inline bool SameFile(const struct stat& a, const struct stat& b) {
+  return a.st_dev == b.st_dev && a.st_ino == b.st_ino && a.st_size == b.st_size &&
+         a.st_mtim.tv_sec == b.st_mtim.tv_sec && a.st_mtim.tv_nsec == b.st_mtim.tv_nsec &&
+         a.st_ctim.tv_sec == b.st_ctim.tv_sec && a.st_ctim.tv_nsec == b.st_ctim.tv_nsec;
+}
+
 /// What was read from a file, kept until the file changes: a look-up costs one stat. Safe for threads.
 template <typename T>
 class StatCache {
@@ -18,7 +25,7 @@ class StatCache {
     struct stat now = {};
     if (stat(path.c_str(), &now) != 0) now = {};
     const std::lock_guard<std::mutex> guard(mutex_);
-    if (content_ == nullptr || path != path_ || !SameFile(now)) {
+    if (content_ == nullptr || path != path_ || !SameFile(now, seen_)) {
       content_ = std::make_shared<const T>(load(path));
       path_ = path;
       seen_ = now;
@@ -32,12 +39,6 @@ class StatCache {
   }
 
  private:
-  bool SameFile(const struct stat& now) const {
-    return now.st_dev == seen_.st_dev && now.st_ino == seen_.st_ino && now.st_size == seen_.st_size &&
-           now.st_mtim.tv_sec == seen_.st_mtim.tv_sec && now.st_mtim.tv_nsec == seen_.st_mtim.tv_nsec &&
-           now.st_ctim.tv_sec == seen_.st_ctim.tv_sec && now.st_ctim.tv_nsec == seen_.st_ctim.tv_nsec;
-  }
-
   std::mutex mutex_;
   std::string path_;
   struct stat seen_ = {};

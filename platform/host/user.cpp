@@ -40,10 +40,10 @@ int KLIBGroupIsAdminGroupMem(const char* name, int only_local) {
   Account account;
   if (!kova::host::FindAccount(std::string(name), account)) return -1;
   if (account.uid == 0) return 1;
-  kova::host::Configuration configuration;
-  if (!kova::host::GetConfiguration(configuration)) return -1;
+  const std::shared_ptr<const kova::host::Configuration> configuration = kova::host::GetConfiguration();
+  if (!configuration->problem.empty()) return KOVA_FAIL(KOVA_ERR_BAD_CONFIGURATION);
   gid_t admins = 0;
-  if (!kova::host::FindGroup(configuration.admin_group, admins)) return 0;
+  if (!kova::host::FindGroup(configuration->admin_group, admins)) return 0;
   const std::vector<gid_t> groups = kova::host::GroupsOf(account);
   return std::find(groups.begin(), groups.end(), admins) == groups.end() ? 0 : 1;
 }

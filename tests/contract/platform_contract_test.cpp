@@ -4,6 +4,7 @@
 #include <unistd.h>
 
 #include <filesystem>
+#include <functional>
 #include <set>
 #include <string>
 #include <vector>
@@ -13,7 +14,9 @@
 #include <kova/error.h>
 #include <kova/file_index.h>
 #include <kova/fs.h>
+#include <kova/notifyd.h>
 #include <kova/recycle.h>
+#include <kova/samba.h>
 #include <kova/share.h>
 #include <kova/sock_connection.h>
 #include <kova/user.h>
@@ -149,6 +152,136 @@ TEST_F(PlatformContractTest, OnlyTheFolderAtTheTopIsTheRecycleBin) {
   EXPECT_NE(1, KOVAShareIsShareRecycle((share + "/#recycled").c_str()));
   EXPECT_NE(1, KOVAShareIsShareRecycle((share + "/sub/#recycle/a").c_str()));
   EXPECT_NE(1, KOVAShareIsShareRecycle((dir_ / "plain/#recycle/a").c_str()));
+}
+
+using Enumerate = int (*)(KLIBCSzList**);
+
+/// What an enumeration appends, in order of the texts.
+std::set<string> Enumerated(const Enumerate enumerate) {
+  KLIBCSzList* list = KLIBCSzListAlloc(1);
+  const int count = enumerate(&list);
+  std::set<string> texts;
+  for (int i = 0; i < list->count; ++i) texts.insert(KLIBCSzListGet(list, i));
+  EXPECT_EQ(count, static_cast<int>(texts.size()));
+  KLIBCSzListFree(list);
+  return texts;
+}
+
+TEST_F(PlatformContractTest, HomeRecycleBinsByTheKindOfTheirOwnersAccount) {
+  const Enumerate every = &KOVARecycleHomeEnumRecyclePath;
+  const Enumerate local = [](KLIBCSzList** list) {
+    return KOVARecycleHomeEnumRecyclePathForAuthType(list, AUTH_LOCAL);
+  };
+  const Enumerate others = [](KLIBCSzList** list) {
+    return KOVARecycleHomeEnumRecyclePathForAuthType(list, static_cast<AUTH_TYPE>(AUTH_DOMAIN | AUTH_LDAP));
+  };
+  EXPECT_TRUE(Enumerated(every).empty()) << "there is no share \"homes\"";
+  const std::vector<string> bins = SetHomes(Folder("homes"));
+  EXPECT_EQ(std::set<string>(bins.begin(), bins.end()), Enumerated(every));
+  EXPECT_EQ(std::set<string>{bins[0]}, Enumerated(local));
+  EXPECT_TRUE(Enumerated(others).empty());
+  EXPECT_LT(KOVARecycleHomeEnumRecyclePath(nullptr), 0);
+}
+
+TEST_F(PlatformContractTest, SpotlightIsOnWhenItIsOnInEveryShare) {
+  SetShares({{"photo", Folder("photo")}, {"music", Folder("music")}});
+  SetSpotlight({{"photo", true}, {"music", false}});
+  EXPECT_EQ(0, KOVASMBIsEnableSpotlight());
+  EXPECT_EQ(0, KOVASMBSetSpotlight(1));
+  EXPECT_EQ(1, KOVASMBIsEnableSpotlight());
+  EXPECT_EQ(0, KOVASMBSetSpotlight(1)) << "it is on already";
+  EXPECT_EQ(0, KOVASMBSetSpotlight(0));
+  EXPECT_EQ(0, KOVASMBIsEnableSpotlight());
+}
+
+Json::Value MonitorDocument(const string& queue, const std::vector<string>& folders) {
+  Json::Value document;
+  document["queue"] = queue;
+  document["config"] = Json::arrayValue;
+  for (const string& folder : folders) {
+    Json::Value watch;
+    watch["path"] = folder;
+    watch["mask"] = 65478;
+    watch["ignore"].append("@eaDir");
+    document["config"].append(watch);
+  }
+  return document;
+}
+
+/// "application type queue: folders" of each registration.
+std::multiset<string> Registered() {
+  std::multiset<string> texts;
+  for (const auto& [application, type, document] : RegisteredQueues()) {
+    string text = application + " " + std::to_string(type) + " " + document["queue"].asString() + ":";
+    for (const Json::Value& watch : document["config"]) {
+      text += " " + watch["path"].asString();
+      EXPECT_EQ(65478U, watch["mask"].asUInt());
+      EXPECT_EQ("@eaDir", watch["ignore"][0].asString());
+    }
+    texts.insert(text);
+  }
+  return texts;
+}
+
+using KOVA::KOVANOTIFYD::MonitorQueue;
+constexpr int kType = KOVA::KOVANOTIFYD::MONITOR_QUEUE_TYPE_APPLICATION;
+
+bool Register(const Json::Value& document, const string& application = "fileindex", int type = kType) {
+  return MonitorQueue::Upsert(MonitorQueue(document), application, type);
+}
+
+TEST_F(PlatformContractTest, AQueueIsRegisteredByItsPathApplicationAndType) {
+  const string odd = "/v/q\xff \"\\\n";
+  EXPECT_TRUE(Register(MonitorDocument("/v/q", {"/v/a", odd})));
+  EXPECT_TRUE(Register(MonitorDocument("/v/q", {}), "other"));
+  EXPECT_TRUE(Register(MonitorDocument("/v/q", {}), "fileindex", 2));
+  EXPECT_TRUE(Register(MonitorDocument(odd, {})));
+  EXPECT_EQ((std::multiset<string>{"fileindex 1 /v/q: /v/a " + odd,
+                                   "other 1 /v/q:", "fileindex 2 /v/q:", "fileindex 1 " + odd + ":"}),
+            Registered());
+  EXPECT_TRUE(Register(MonitorDocument("/v/q", {"/v/b"}))) << "in place of the first";
+  EXPECT_TRUE(MonitorQueue::Delete("/v/q", "other", kType));
+  EXPECT_TRUE(MonitorQueue::Delete("/v/q", "other", kType)) << "there is none any more";
+  EXPECT_TRUE(MonitorQueue::Delete("/v/q", "fileindex", 2));
+  EXPECT_TRUE(MonitorQueue::Delete(odd, "fileindex", kType));
+  EXPECT_EQ(std::multiset<string>{"fileindex 1 /v/q: /v/b"}, Registered());
+  EXPECT_TRUE(MonitorQueue::Delete("/v/q", "fileindex", kType));
+}
+
+TEST_F(PlatformContractTest, ABadRegistrationIsRefusedWholeAndChangesNothing) {
+  const Json::Value good = MonitorDocument("/v/q", {"/v/a", "/v/b"});
+  ASSERT_TRUE(Register(good));
+  const auto with = [&](const std::function<void(Json::Value&)>& change) {
+    Json::Value document = MonitorDocument("/v/q", {"/v/c", "/v/d"});
+    change(document);
+    return document;
+  };
+  const Json::Value bad[] = {
+      Json::Value(),
+      Json::Value("/v/q"),
+      Json::Value(Json::arrayValue),
+      with([](Json::Value& d) { d["queue"] = "v/q"; }),
+      with([](Json::Value& d) { d["queue"] = 1; }),
+      with([](Json::Value& d) { d.removeMember("queue"); }),
+      with([](Json::Value& d) { d["config"] = Json::objectValue; }),
+      with([](Json::Value& d) { d["config"] = Json::nullValue; }),
+      with([](Json::Value& d) { d["config"][1] = "/v/d"; }),
+      with([](Json::Value& d) { d["config"][1]["path"] = "v/d"; }),
+      with([](Json::Value& d) { d["config"][1]["path"] = string("/v/d\0e", 6); }),
+      with([](Json::Value& d) { d["config"][1]["mask"] = -1; }),
+      with([](Json::Value& d) { d["config"][1]["mask"] = "65478"; }),
+      with([](Json::Value& d) { d["config"][1].removeMember("ignore"); }),
+      with([](Json::Value& d) { d["config"][1]["ignore"] = "@eaDir"; }),
+      with([](Json::Value& d) { d["config"][1]["ignore"].append("a/b"); }),
+      with([](Json::Value& d) { d["config"][1]["ignore"].append(".."); }),
+      with([](Json::Value& d) { d["config"][1]["ignore"].append(""); }),
+  };
+  for (const Json::Value& document : bad) {
+    EXPECT_FALSE(Register(document)) << document.toStyledString();
+    EXPECT_EQ(KOVA_ERR_BAD_PARAMETER, KLIBCErrGet());
+    EXPECT_EQ(std::multiset<string>{"fileindex 1 /v/q: /v/a /v/b"}, Registered());
+  }
+  EXPECT_TRUE(MonitorQueue::Delete("/v/q", "fileindex", kType));
 }
 
 using Compose = int (*)(const char*, char*, size_t);

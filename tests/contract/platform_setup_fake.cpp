@@ -18,4 +18,25 @@ void SetShares(const std::vector<ShareSetup>& shares) {
   }
 }
 
+std::vector<std::string> SetHomes(const std::string& homes) {
+  SetShares({{"homes", homes}});
+  const std::string local = homes + "/root/#recycle", nobodys = homes + "/no-such-user-here/#recycle";
+  FakePlatform::Get().home_recycle_paths = {{local, AUTH_LOCAL}, {nobodys, AUTH_TYPE()}};
+  return {local, nobodys};
+}
+
+void SetSpotlight(const std::map<std::string, bool>& shares) {
+  int on = 1;
+  for (const auto& share : shares) on &= share.second ? 1 : 0;
+  FakePlatform::Get().spotlight = on;
+}
+
+std::vector<RegisteredQueue> RegisteredQueues() {
+  std::vector<RegisteredQueue> queues;
+  for (const auto& [key, document] : FakePlatform::Get().monitor_queues) {
+    queues.emplace_back(std::get<0>(key), std::get<1>(key), document);
+  }
+  return queues;
+}
+
 }  // namespace ferrox::test

@@ -79,7 +79,8 @@ struct FakePlatform {
   std::set<std::string> mount_points;
   /// Path prefixes (whole components).
   std::set<std::string> snapshots, recycle_bins, home_recycle_bins;
-  /// What the enumerations of home recycle bins return, in this order: full path and where the account comes from.
+  /// What the enumerations of home recycle bins return, in this order: full path and where the account comes from (0: a
+  /// folder without one).
   std::map<std::string, AUTH_TYPE> home_recycle_paths;
   /// KOVAACLPermGet by path; what access(2) says for others.
   std::map<std::string, int> permissions;

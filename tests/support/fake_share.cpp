@@ -31,12 +31,14 @@ int AnyHolds(const std::set<std::string>& folders, const std::string& path) {
   return 0;
 }
 
+constexpr int kEveryHome = -1;
+
 /// The home recycle bins of accounts of these kinds; how many, or below 0.
 int PushHomeRecyclePaths(KLIBCSzList** list, int auth_types) {
   if (list == nullptr || *list == nullptr) return KOVA_FAIL(KOVA_ERR_BAD_PARAMETER);
   int count = 0;
   for (const auto& [path, auth] : FakePlatform::Get().home_recycle_paths) {
-    if ((auth & auth_types) == 0) continue;
+    if (auth_types != kEveryHome && (auth & auth_types) == 0) continue;
     if (KLIBCSzListPush(list, path.c_str()) < 0) return -1;
     ++count;
   }
@@ -138,7 +140,7 @@ int KOVARecycleUserHomePathIsExist(const char* full_path, int auth_types) {
 }
 
 int KOVARecycleHomeEnumRecyclePath(KLIBCSzList** list) {
-  return FakeCallFails(__func__, "") ? -1 : PushHomeRecyclePaths(list, AUTH_LOCAL | AUTH_DOMAIN | AUTH_LDAP);
+  return FakeCallFails(__func__, "") ? -1 : PushHomeRecyclePaths(list, kEveryHome);
 }
 int KOVARecycleHomeEnumRecyclePathForAuthType(KLIBCSzList** list, AUTH_TYPE auth) {
   return FakeCallFails(__func__, std::to_string(auth)) ? -1 : PushHomeRecyclePaths(list, auth);

@@ -21,7 +21,8 @@ typedef enum AUTH_TYPE {
 } AUTH_TYPE;
 
 /// Append the full paths of the recycle bins that exist in the homes of users, all or those of one kind of accounts, to
-/// `*list`. 0 or more: how many; below 0 on failure. Without a share "homes" there are none.
+/// `*list`, in no order. A link is no recycle bin, and a home that cannot be read has none. 0 or more: how many; below
+/// 0 on failure. Without a share "homes" there are none.
 int KOVARecycleHomeEnumRecyclePath(KLIBCSzList** list);
 int KOVARecycleHomeEnumRecyclePathForAuthType(KLIBCSzList** list, AUTH_TYPE auth);
 

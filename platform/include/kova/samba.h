@@ -6,11 +6,12 @@
 extern "C" {
 #endif
 
-/// Whether Spotlight searches are on in every share that the file-sharing service offers: 1 or 0. Without a
-/// file-sharing service, or when its configuration cannot be read, 0.
+/// Whether Spotlight searches are on in the section of every share of this host that has one in the service's
+/// configuration: 1 or 0. 0 as well when no share has a section there, without a file-sharing service, and when its
+/// configuration cannot be read.
 int KOVASMBIsEnableSpotlight(void);
-/// Switches Spotlight on (1) or off (0) in each of these shares' sections of the service's configuration. 0, or below
-/// 0 with the configuration as it was; without a file-sharing service KOVA_ERR_NOT_SUPPORTED.
+/// Switches Spotlight on (1) or off (0) in these sections. 0, or below 0 with the configuration as it was; with no
+/// section to switch KOVA_ERR_NOT_SUPPORTED.
 int KOVASMBSetSpotlight(int enable);
 
 #ifdef __cplusplus

@@ -1,0 +1,168 @@
+#include "platform/host/notify_registry.h"
+
+#include <syslog.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <cstring>
+#include <filesystem>
+
+#include <json/value.h>
+#include <json/writer.h>
+
+#include <kova/instance.h>
+#include <kova/notifyd.h>
+
+#include "platform/base/failure.h"
+#include "platform/base/index_paths.h"
+#include "platform/base/monitor_document.h"
+#include "platform/host/files.h"
+#include "platform/host/log.h"
+
+namespace kova::host {
+
+namespace {
+
+constexpr char kSuffix[] = ".json";
+
+/// What one registration is found by.
+struct Key {
+  std::string queue;
+  std::string application;
+  int type = 0;
+
+  /// Different keys have different files: no application's name holds a "/".
+  std::string File() const {
+    return RegistryFolder() + "/" + EscapeSharePath("/" + application + "/" + std::to_string(type) + queue) + kSuffix;
+  }
+};
+
+Json::Value ToJson(const Json::Value& document, const Key& key) {
+  Json::Value object = document;
+  object["application"] = key.application;
+  object["type"] = key.type;
+  return object;
+}
+
+std::string ToText(const Json::Value& object) {
+  Json::StreamWriterBuilder builder;
+  builder["indentation"] = "";
+  builder["emitUTF8"] = true;
+  return Json::writeString(builder, object) + "\n";
+}
+
+/// What is wrong with a registration's file; empty when nothing is. A missing file is a null value.
+std::string ReadFile(const std::string& path, Json::Value& object) {
+  std::string problem = ReadJsonFile(path, object);
+  if (problem.empty() && object.isNull() && access(path.c_str(), F_OK) != 0) return {};
+  if (problem.empty()) problem = MonitorDocumentProblem(object);
+  if (problem.empty() && (!object["application"].isString() || !object["type"].isInt())) {
+    problem = "\"application\" or \"type\" is missing";
+  }
+  if (problem.empty()) {
+    const Key key = {object["queue"].asString(), object["application"].asString(), object["type"].asInt()};
+    if (key.File() != path) problem = "it holds the registration that belongs in " + key.File();
+  }
+  if (problem.empty()) return {};
+  return "the registration " + path + " cannot be used (" + problem +
+         "); move it away, then set the share's folders again, which registers them anew";
+}
+
+Registration FromJson(const Json::Value& object) {
+  Registration registration = {object["application"].asString(), object["type"].asInt(), object["queue"].asString()};
+  for (const Json::Value& element : object["config"]) {
+    Watch watch = {element["path"].asString(), element["mask"].asUInt()};
+    for (const Json::Value& name : element["ignore"]) watch.ignore.push_back(name.asString());
+    registration.watches.push_back(std::move(watch));
+  }
+  return registration;
+}
+
+bool Refuse(int code, const std::string& problem) {
+  LogLine(LOG_ERR, problem);
+  (void)KOVA_FAIL(code);
+  return false;
+}
+
+bool RefuseBySystem(const std::string& problem, int error) {
+  errno = error;
+  return Refuse(SystemFailureCode(), problem + ": " + strerror(error));
+}
+
+std::string KeyProblem(const Key& key) {
+  if (key.application.empty() || key.application.find_first_of(std::string("/\0", 2)) != std::string::npos) {
+    return "\"" + key.application + "\" cannot be the name of an application that registers a queue";
+  }
+  return {};
+}
+
+/// Changes the file of one registration while nobody else does. `change` is not called when the file that is there
+/// cannot be used: nobody's watches are dropped unseen.
+template <typename Change>
+bool ChangeFile(const Key& key, Change change) {
+  const std::string path = key.File();
+  const ExclusiveLock lock(RegistryFolder() + ".lock");
+  if (lock.Problem() != 0) return RefuseBySystem("cannot lock " + RegistryFolder() + ".lock", lock.Problem());
+  Json::Value present;
+  const std::string problem = ReadFile(path, present);
+  if (!problem.empty()) return Refuse(KOVA_ERR_BAD_CONFIGURATION, problem);
+  return change(path, present) || RefuseBySystem("cannot change the registration " + path, errno);
+}
+
+}  // namespace
+
+std::string RegistryFolder() { return InstanceRoot() + "/var/lib/kova/notifyd/queues"; }
+
+Registrations ReadRegistrations() {
+  std::vector<std::string> paths;
+  std::error_code error;
+  for (std::filesystem::directory_iterator entry(RegistryFolder(), error), end; !error && entry != end;
+       entry.increment(error)) {
+    if (entry->path().extension() == kSuffix) paths.push_back(entry->path());
+  }
+  std::sort(paths.begin(), paths.end());
+  Registrations registrations;
+  if (error && error != std::errc::no_such_file_or_directory) {
+    registrations.problems.push_back("the folder " + RegistryFolder() + " cannot be read: " + error.message());
+  }
+  for (const std::string& path : paths) {
+    Json::Value object;
+    const std::string problem = ReadFile(path, object);
+    if (!problem.empty()) {
+      registrations.problems.push_back(problem);
+    } else if (!object.isNull()) {
+      registrations.list.push_back(FromJson(object));
+    }
+  }
+  return registrations;
+}
+
+}  // namespace kova::host
+
+namespace KOVA::KOVANOTIFYD {
+
+using namespace kova::host;
+
+bool MonitorQueue::Upsert(const MonitorQueue& queue, const std::string& application, int type) {
+  std::string problem = kova::MonitorDocumentProblem(queue.Document());
+  if (!problem.empty()) return Refuse(KOVA_ERR_BAD_PARAMETER, "nothing is registered: " + problem);
+  const Key key = {queue.Document()["queue"].asString(), application, type};
+  const std::string text = ToText(ToJson(queue.Document(), key));
+  problem = KeyProblem(key);
+  if (problem.empty() && text.size() > kFileMaxBytes) problem = "the registration of " + key.queue + " is too large";
+  if (!problem.empty()) return Refuse(KOVA_ERR_BAD_PARAMETER, problem);
+  return ChangeFile(key, [&](const std::string& path, const Json::Value& present) {
+    if (!present.isNull() && ToText(present) == text) return true;
+    return MakeFolders(RegistryFolder(), 0755) && ReplaceFile(path, text, 0644);
+  });
+}
+
+bool MonitorQueue::Delete(const std::string& queue_path, const std::string& application, int type) {
+  const Key key = {queue_path, application, type};
+  if (!KeyProblem(key).empty()) return true;  // nobody can have registered it
+  return ChangeFile(
+      key, [](const std::string& path, const Json::Value& present) { return present.isNull() || RemoveFile(path); });
+}
+
+}  // namespace KOVA::KOVANOTIFYD
