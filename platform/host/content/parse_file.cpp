@@ -123,6 +123,7 @@ void ParseFile(const std::string& path, const Json::Value& config, Json::Value& 
     document["KOVAMDContentType"] = type->mime;
   }
   if (!need_meta || S_ISDIR(facts.info.stx_mode)) return;
+  document["_KOVANeedMeta"] = true;
   const bool has_reader = special == nullptr && (type == nullptr || type->reader != Reader::kNone);
   const std::string reason = special != nullptr ? "not a regular file"
                              : has_reader       ? AddContent(path, facts, type, document)

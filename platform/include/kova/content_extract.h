@@ -14,11 +14,12 @@ namespace KOVA::CONTENT_EXTRACT {
 /// Values have the types of the index schema; a field that is not known is absent.
 ///
 /// Members beside the schema's: "_KOVAStamp" (string; changes when size, mtime, ctime or inode does) always; when the
-/// content was wanted, "_KOVAExtractError" (string; the reason) where it could not be read, else "_KOVATextEncoding"
-/// (string; " (guess)" at its end when the text was too short to tell) and, where there was more text than is kept,
-/// "_KOVATextCut" (true). A file without readable content still yields the document of its name; formats that no reader
-/// exists for have neither text nor error. The text is at most 1 MiB, from at most the first 2 MiB of the file. Blocks
-/// for the reading of one file. May be called by several threads at once.
+/// content was wanted, and of anything but a folder, "_KOVANeedMeta" (true), "_KOVAExtractError" (string; the reason)
+/// where it could not be read, else "_KOVATextEncoding" (string; " (guess)" at its end when the text was too short to
+/// tell) and, where there was more text than is kept, "_KOVATextCut" (true). A file without readable content still
+/// yields the document of its name; formats that no reader exists for have neither text nor error. The text is at most
+/// 1 MiB, from at most the first 2 MiB of the file. Blocks for the reading of one file. May be called by several
+/// threads at once.
 /// @throws std::runtime_error when `path` does not exist or cannot be examined at all.
 void ParseFile(const std::string& path, const Json::Value& config, Json::Value& document);
 

@@ -1,0 +1,39 @@
+#pragma once
+
+#include <string>
+#include <vector>
+
+#include "services/fileindexd/document_writer.h"
+#include "services/fileindexd/path_rules.h"
+#include "services/fileindexd/share_folders.h"
+#include "services/fileindexd/share_index.h"
+
+namespace ferrox::indexd {
+
+/// Takes documents along when what they describe is renamed, to spare reading the files again. Only that: a rename is a
+/// hint, and both places are compared with the disk afterwards. Later renames have carried the earlier ones along in the
+/// queue, which then no longer tells what happened (two folders that were swapped, for example), and an earlier pass may
+/// have seen the disk as it is now.
+class DocumentMover {
+ public:
+  /// All outlive it; `root` is the share's folder.
+  DocumentMover(const std::string& root, ShareIndex& index, const ShareFolders& folders, PathRules& rules,
+                DocumentWriter& writer)
+      : root_(root), index_(index), folders_(folders), rules_(rules), writer_(writer) {}
+
+  /// Follows the rename of `old_path`, which lay outside the present root when the share itself was renamed or moved.
+  void Move(const std::string& path, const std::string& old_path);
+
+ private:
+  std::vector<std::string> IndexedTopsOf(const std::string& path);
+  std::vector<std::string> EntriesOfRoot() const;
+  bool HoldsDocumentsOf(const std::string& old_path, const std::string& path);
+
+  const std::string& root_;
+  ShareIndex& index_;
+  const ShareFolders& folders_;
+  PathRules& rules_;
+  DocumentWriter& writer_;
+};
+
+}  // namespace ferrox::indexd

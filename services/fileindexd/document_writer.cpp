@@ -1,0 +1,91 @@
+#include "services/fileindexd/document_writer.h"
+
+#include <cerrno>
+
+#include <kova/content_extract.h>
+
+#include "common/file_util.h"
+
+namespace ferrox::indexd {
+
+using KOVA::CONTENT_EXTRACT::SameContent;
+using KOVA::CONTENT_EXTRACT::Stamp;
+
+Presence LookAt(const std::string& path, struct stat& status) {
+  if (lstat(path.c_str(), &status) == 0) return S_ISLNK(status.st_mode) ? Presence::kGone : Presence::kThere;
+  return errno == ENOENT || errno == ENOTDIR || errno == ELOOP ? Presence::kGone : Presence::kUnknown;
+}
+
+bool DocumentWriter::WantsContent(const std::string& path, const struct stat& status) const {
+  return !S_ISDIR(status.st_mode) && folders_.WantsContent(path);
+}
+
+bool DocumentWriter::IsCurrent(const IndexedEntry& indexed, const struct stat& status) const {
+  return indexed.stamp == Stamp(status) && indexed.with_content == WantsContent(indexed.path, status);
+}
+
+void DocumentWriter::Write(const std::string& path) {
+  struct stat status = {};
+  if (LookAt(path, status) == Presence::kGone) return Remove(path);
+  try {
+    WillChange();
+    index_.Upsert(path, WantsContent(path, status));
+    status_.DocumentWritten();
+  } catch (const Error& error) {
+    RecordFailure(error, path);
+  }
+}
+
+void DocumentWriter::RefreshAttributes(const std::string& path) {
+  struct stat status = {};
+  if (LookAt(path, status) == Presence::kGone) return Remove(path);
+  const auto indexed = index_.Find(path);
+  const bool same_content = !indexed.empty() && SameContent(indexed.front().stamp, Stamp(status)) &&
+                            indexed.front().with_content == WantsContent(path, status);
+  if (!same_content) return Write(path);
+  try {
+    WillChange();
+    index_.Attr(path);
+    status_.DocumentWritten();
+  } catch (const Error& error) {
+    if (error.Code() == Error::kEngineNoSuchDocument) return Write(path);
+    RecordFailure(error, path);
+  }
+}
+
+void DocumentWriter::RefreshRenamed(const std::string& path, const std::string& old_path) {
+  struct stat status = {};
+  if (LookAt(path, status) != Presence::kThere) return;
+  const bool same_kind = GetFileExtension(path, true) == GetFileExtension(old_path, true);
+  same_kind ? RefreshAttributes(path) : Write(path);
+}
+
+/// Called while an error is handled: goes on when it is the file's, passes it on when it is the engine's.
+void DocumentWriter::RecordFailure(const Error& error, const std::string& path) {
+  struct stat status = {};
+  if (error.Code() == Error::kParseFailed) {
+    if (LookAt(path, status) == Presence::kGone) return Remove(path);
+    return status_.AddFailure("cannot be examined", path);
+  }
+  if (error.Code() != Error::kEngineBadRequest) throw;
+  status_.AddFailure(error.what(), path);
+}
+
+void DocumentWriter::Remove(const std::string& path) {
+  WillChange();
+  index_.Delete(path);
+  status_.DocumentDeleted();
+}
+
+void DocumentWriter::RemoveTree(const std::string& path) {
+  Remove(path);
+  index_.DeleteBelow(path);
+}
+
+void DocumentWriter::Commit() {
+  uncommitted_ = false;
+  index_.Commit();
+  status_.Committed();
+}
+
+}  // namespace ferrox::indexd

@@ -1,0 +1,58 @@
+#pragma once
+
+#include <sys/stat.h>
+
+#include <atomic>
+#include <string>
+
+#include "common/error.h"
+#include "services/fileindexd/share_folders.h"
+#include "services/fileindexd/share_index.h"
+#include "services/fileindexd/share_status.h"
+
+namespace ferrox::indexd {
+
+enum class Presence { kThere, kGone, kUnknown };
+
+/// What is at `path` for the index: links count as nothing. Leaves errno set when that is unknown.
+Presence LookAt(const std::string& path, struct stat& status);
+
+/// Brings single documents in step with their files. A file that cannot be indexed is recorded and passed over; what
+/// the index itself refuses is thrown. Every call is safe from several threads.
+class DocumentWriter {
+ public:
+  /// All outlive it.
+  DocumentWriter(ShareIndex& index, const ShareFolders& folders, ShareStatus& status)
+      : index_(index), folders_(folders), status_(status) {}
+
+  /// Whether the document tells the truth about the file, and holds its content exactly when that is wanted.
+  bool IsCurrent(const IndexedEntry& indexed, const struct stat& status) const;
+
+  /// Writes the whole document of what is at the path, or removes it when there is nothing.
+  void Write(const std::string& path);
+  /// The same, of the attributes alone when that cannot make an old content look like a new one.
+  void RefreshAttributes(const std::string& path);
+  /// The same after a rename, which changes the moved entry itself and, with another extension, the way in which its
+  /// content is read. Does nothing when it is gone already: a later operation knows its present place and still needs
+  /// the document.
+  void RefreshRenamed(const std::string& path, const std::string& old_path);
+  void Remove(const std::string& path);
+  void RemoveTree(const std::string& path);
+
+  /// Makes all that was done durable. @throws Error.
+  void Commit();
+  bool HasUncommitted() const { return uncommitted_; }
+  /// To be called before the index is changed past this object.
+  void WillChange() { uncommitted_ = true; }
+
+ private:
+  bool WantsContent(const std::string& path, const struct stat& status) const;
+  void RecordFailure(const Error& error, const std::string& path);
+
+  ShareIndex& index_;
+  const ShareFolders& folders_;
+  ShareStatus& status_;
+  std::atomic<bool> uncommitted_{false};
+};
+
+}  // namespace ferrox::indexd

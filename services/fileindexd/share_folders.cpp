@@ -1,0 +1,78 @@
+#include "services/fileindexd/share_folders.h"
+
+#include "common/error.h"
+#include "common/file_util.h"
+#include "fileindex/folder_mgr.h"
+#include "fileindex/util.h"
+
+namespace ferrox::indexd {
+
+namespace {
+
+/// "" for an entry that names no share, as only a file written by hand has it.
+std::string ShareOf(const fileindex::Folder& folder) {
+  try {
+    return folder.GetShare();
+  } catch (const Error&) {
+    return "";
+  }
+}
+
+}  // namespace
+
+ShareFolders ShareFolders::Load(const std::string& share, const std::string& root) {
+  ShareFolders loaded;
+  const fileindex::FolderMgr folder_mgr;
+  for (const auto& folder : folder_mgr.GetFolders()) {
+    if (ShareOf(*folder) != share) continue;
+    // Of a path that stands twice, the first counts.
+    (void)loaded.kinds_.emplace(root + folder->GetPath().substr(1 + share.size()),
+                                Kinds{folder->IsDocument(), folder->IsAudio(), folder->IsVideo(), folder->IsPhoto()});
+  }
+  return loaded;
+}
+
+const ShareFolders::Kinds* ShareFolders::Governing(std::string_view full_path) const {
+  for (size_t end = full_path.size(); end != std::string_view::npos && end > 0; end = full_path.rfind('/', end - 1)) {
+    const auto found = kinds_.find(full_path.substr(0, end));
+    if (found != kinds_.end()) return &found->second;
+  }
+  return nullptr;
+}
+
+ShareFolders::Place ShareFolders::PlaceOf(std::string_view full_path) const {
+  if (Governing(full_path) != nullptr) return Place::kIndexed;
+  const std::string below = std::string(full_path) + "/";
+  const auto next = kinds_.lower_bound(below);
+  return next != kinds_.end() && StringStartWith(next->first, below) ? Place::kOnTheWay : Place::kOutside;
+}
+
+bool ShareFolders::WantsContent(const std::string& full_path) const {
+  const Kinds* kinds = Governing(full_path);
+  if (kinds == nullptr) return false;
+  const auto type = static_cast<size_t>(fileindex::GetFileTypeByFullPath(full_path));
+  return type >= kinds->size() || (*kinds)[type];
+}
+
+std::vector<std::string> ShareFolders::TopmostBelow(const std::string& full_path) const {
+  std::vector<std::string> topmost;
+  for (auto at = kinds_.lower_bound(full_path + "/");
+       at != kinds_.end() && StringStartWith(at->first, full_path + "/"); ++at) {
+    if (Governing(Dirname(at->first)) == nullptr) topmost.push_back(at->first);
+  }
+  return topmost;
+}
+
+std::vector<std::string> ShareFolders::DifferingFrom(const ShareFolders& other) const {
+  std::vector<std::string> differing;
+  for (const auto& [path, kinds] : kinds_) {
+    const auto theirs = other.kinds_.find(path);
+    if (theirs == other.kinds_.end() || theirs->second != kinds) differing.push_back(path);
+  }
+  for (const auto& [path, kinds] : other.kinds_) {
+    if (kinds_.find(path) == kinds_.end()) differing.push_back(path);
+  }
+  return differing;
+}
+
+}  // namespace ferrox::indexd

@@ -1,0 +1,49 @@
+#pragma once
+
+#include <array>
+#include <cstddef>
+#include <map>
+#include <string>
+#include <string_view>
+#include <vector>
+
+namespace ferrox::indexd {
+
+/// The indexed folders of one share as they were configured at one moment: what decides, whatever the disk holds, which
+/// paths have a document and of which files the content is read. Of folders that lie in each other the deepest governs.
+/// Only the share's own folders count, also where another share lies in it. Safe for several threads.
+class ShareFolders {
+ public:
+  enum class Place {
+    kOutside,   ///< under no folder
+    kOnTheWay,  ///< under no folder, but one lies below
+    kIndexed,   ///< a folder, or under one
+  };
+
+  /// No folders.
+  ShareFolders() = default;
+  /// The folders of `share`, whose own folder is `root`, as the folders file holds them now.
+  /// @throws Error kLoadFailed; kBadArgument.
+  static ShareFolders Load(const std::string& share, const std::string& root);
+
+  bool operator==(const ShareFolders& other) const = default;
+  size_t Count() const { return kinds_.size(); }
+
+  Place PlaceOf(std::string_view full_path) const;
+  /// Whether the content of a file there is read: its kind is on, or it is of none of the four kinds.
+  bool WantsContent(const std::string& full_path) const;
+  /// The folders below a path, without those that lie in another of them.
+  std::vector<std::string> TopmostBelow(const std::string& full_path) const;
+  /// The folders that only one of the two has, and those whose kinds differ.
+  std::vector<std::string> DifferingFrom(const ShareFolders& other) const;
+
+ private:
+  using Kinds = std::array<bool, 4>;  ///< in the order of fileindex::FileType
+
+  /// The kinds under which the path lies; null when it is under no folder.
+  const Kinds* Governing(std::string_view full_path) const;
+
+  std::map<std::string, Kinds, std::less<>> kinds_;  ///< by full path
+};
+
+}  // namespace ferrox::indexd
