@@ -12,7 +12,7 @@ namespace ferrox::indexd {
 
 /// What a comparison found. Called in the order of the paths, by the calling thread.
 struct ComparisonActions {
-  /// Whether the document of this stamp still tells the truth about the file.
+  /// Whether the document tells the truth about the file, and all of it that is wanted.
   std::function<bool(const IndexedEntry& indexed, const struct stat& status)> is_current;
   /// The file is new or changed.
   std::function<void(const std::string& path, const struct stat& status)> write;

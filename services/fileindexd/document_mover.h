@@ -11,9 +11,9 @@
 namespace ferrox::indexd {
 
 /// Takes documents along when what they describe is renamed, to spare reading the files again. Only that: a rename is a
-/// hint, and both places are compared with the disk afterwards. Later renames have carried the earlier ones along in the
-/// queue, which then no longer tells what happened (two folders that were swapped, for example), and an earlier pass may
-/// have seen the disk as it is now.
+/// hint, and both places are compared with the disk afterwards. Later renames have carried the earlier ones along in
+/// the queue, which then no longer tells what happened (two folders that were swapped, for example), and an earlier
+/// pass may have seen the disk as it is now.
 class DocumentMover {
  public:
   /// All outlive it; `root` is the share's folder.

@@ -33,8 +33,8 @@ DirPtr OpenFolder(const std::string& path, dev_t& device) {
 
 }  // namespace
 
-FileCount::FileCount(const std::string& folder, ShareStatus& status)
-    : status_(status), thread_([this, folder] { Count(folder); }) {}
+FileCount::FileCount(const std::string& folder, const ShareFolders& folders, ShareStatus& status)
+    : folders_(folders), status_(status), thread_([this, folder] { Count(folder); }) {}
 
 FileCount::~FileCount() {
   stop_.Request();
@@ -42,6 +42,7 @@ FileCount::~FileCount() {
 }
 
 void FileCount::Count(const std::string& folder) {
+  using Place = ShareFolders::Place;
   std::vector<std::string> waiting = {folder};
   uint64_t files = 0;
   dev_t root_device = 0;
@@ -53,11 +54,13 @@ void FileCount::Count(const std::string& folder) {
     if (!dir) continue;
     if (first) root_device = device;
     if (device != root_device) continue;
+    const bool indexed = folders_.PlaceOf(path) == Place::kIndexed;
     while (const dirent* entry = readdir(dir.get())) {
       const std::string name = entry->d_name;
       if (name == "." || name == ".." || entry->d_type == DT_LNK || PathRules::SkipName(name)) continue;
-      ++files;
-      if (entry->d_type == DT_DIR) waiting.push_back(path + "/" + name);
+      const Place place = indexed ? Place::kIndexed : folders_.PlaceOf(path + "/" + name);
+      if (place == Place::kIndexed) ++files;
+      if (place != Place::kOutside && entry->d_type == DT_DIR) waiting.push_back(path + "/" + name);
     }
     if (stop_.Requested()) return;
     status_.SetEstimate(files, false);

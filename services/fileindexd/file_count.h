@@ -4,15 +4,17 @@
 #include <thread>
 
 #include "services/fileindexd/interruption.h"
+#include "services/fileindexd/share_folders.h"
 #include "services/fileindexd/share_status.h"
 
 namespace ferrox::indexd {
 
-/// Counts the files below a folder in a thread of its own while it lives, so that progress has an end to compare with.
-/// A quick count: it only reads names, and stays on the folder's device.
+/// Counts the files below a folder that are indexed, in a thread of its own while it lives, so that progress has an end
+/// to compare with. A quick count: it only reads names, and stays on the folder's device.
 class FileCount {
  public:
-  FileCount(const std::string& folder, ShareStatus& status);
+  /// `folders` and `status` outlive it.
+  FileCount(const std::string& folder, const ShareFolders& folders, ShareStatus& status);
   FileCount(const FileCount&) = delete;
   FileCount& operator=(const FileCount&) = delete;
   ~FileCount();
@@ -20,6 +22,7 @@ class FileCount {
  private:
   void Count(const std::string& folder);
 
+  const ShareFolders& folders_;
   ShareStatus& status_;
   Interruption stop_;
   std::thread thread_;

@@ -1,4 +1,4 @@
-#include "services/fileindexd/queue_watch.h"
+#include "services/fileindexd/file_watch.h"
 
 #include <poll.h>
 #include <sys/eventfd.h>
@@ -32,20 +32,24 @@ bool DrainWake(int fd) {
 
 }  // namespace
 
-QueueWatch::QueueWatch(const std::string& queue_path)
-    : queue_name_(Basename(queue_path)),
-      inotify_(inotify_init1(IN_CLOEXEC | IN_NONBLOCK)),
-      wake_(eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK)) {
+FileWatch::FileWatch(const std::vector<std::string>& paths)
+    : inotify_(inotify_init1(IN_CLOEXEC | IN_NONBLOCK)), wake_(eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK)) {
   FERROX_FAIL_IF(!wake_.Valid(), Error::kInternal, "eventfd failed, reason=" + ErrnoText());
-  const std::string folder = Dirname(queue_path);
-  if (inotify_.Valid() &&
-      inotify_add_watch(inotify_.Get(), folder.c_str(), IN_CREATE | IN_MODIFY | IN_MOVED_TO | IN_ONLYDIR) < 0) {
-    inotify_.Reset();
-  }
-  if (!inotify_.Valid()) Log(LOG_WARNING, "%s cannot be watched (%m), it is looked at now and then", folder.c_str());
+  for (const std::string& path : paths) Watch(path);
 }
 
-void QueueWatch::Wait(std::chrono::milliseconds limit) {
+void FileWatch::Watch(const std::string& path) {
+  constexpr uint32_t kChanges = IN_CREATE | IN_MODIFY | IN_MOVED_TO | IN_ONLYDIR;
+  const int watch = inotify_add_watch(inotify_.Get(), Dirname(path).c_str(), kChanges);
+  if (watch >= 0) {
+    watched_.emplace(watch, Basename(path));
+    return;
+  }
+  sees_changes_ = false;
+  Log(LOG_WARNING, "%s cannot be watched (%m), it is looked at now and then", path.c_str());
+}
+
+void FileWatch::Wait(std::chrono::milliseconds limit) {
   const auto end = Clock::now() + limit;
   while (WaitReadable(inotify_.Get(), wake_.Get(), end)) {
     const bool woken = DrainWake(wake_.Get());
@@ -53,18 +57,18 @@ void QueueWatch::Wait(std::chrono::milliseconds limit) {
   }
 }
 
-void QueueWatch::WaitForWake(std::chrono::milliseconds limit) {
+void FileWatch::WaitForWake(std::chrono::milliseconds limit) {
   const auto end = Clock::now() + limit;
   if (WaitReadable(-1, wake_.Get(), end)) (void)DrainWake(wake_.Get());
 }
 
-void QueueWatch::Wake() {
+void FileWatch::Wake() {
   const uint64_t one = 1;
   (void)!write(wake_.Get(), &one, sizeof(one));  // fails only when a wake is pending many times over
 }
 
-/// Whether one of the events is of the queue. After an overflow, any could have been.
-bool QueueWatch::DrainEvents() {
+/// Whether one of the events is of a file that is watched. After an overflow, any could have been.
+bool FileWatch::DrainEvents() {
   if (!inotify_.Valid()) return false;
   alignas(inotify_event) char buffer[16 * 1024];
   bool ours = false;
@@ -72,7 +76,8 @@ bool QueueWatch::DrainEvents() {
   while ((size = read(inotify_.Get(), buffer, sizeof(buffer))) > 0) {
     for (ssize_t at = 0; at < size;) {
       const auto* event = reinterpret_cast<const inotify_event*>(buffer + at);
-      ours = ours || (event->mask & IN_Q_OVERFLOW) != 0 || (event->len > 0 && queue_name_ == event->name);
+      ours = ours || (event->mask & IN_Q_OVERFLOW) != 0 ||
+             (event->len > 0 && watched_.count({event->wd, event->name}) != 0);
       at += static_cast<ssize_t>(sizeof(inotify_event) + event->len);
     }
   }

@@ -1,29 +1,35 @@
 #pragma once
 
 #include <chrono>
+#include <set>
 #include <string>
+#include <utility>
+#include <vector>
 
 #include "common/unique_fd.h"
 
 namespace ferrox::indexd {
 
-/// Waits for a queue file to change or for a call from another thread.
-class QueueWatch {
+/// Waits for files to change or for a call from another thread.
+class FileWatch {
  public:
-  /// Without inotify (its instances are limited) only time and Wake end a wait.
-  explicit QueueWatch(const std::string& queue_path);
+  /// Without inotify (its instances are limited), or where a file's folder is missing, only time and Wake end a wait.
+  explicit FileWatch(const std::vector<std::string>& paths);
 
-  /// Returns after a change of the queue, after Wake, or after `limit`; a change or a Wake since the last wait counts.
+  /// Returns after a change of one of the files, after Wake, or after `limit`; a change or a Wake since the last wait
+  /// counts.
   void Wait(std::chrono::milliseconds limit);
   /// The same for Wake alone.
   void WaitForWake(std::chrono::milliseconds limit);
   void Wake();
-  bool SeesChanges() const { return inotify_.Valid(); }
+  bool SeesChanges() const { return sees_changes_; }
 
  private:
+  void Watch(const std::string& path);
   bool DrainEvents();
 
-  std::string queue_name_;
+  std::set<std::pair<int, std::string>> watched_;  ///< the watch of a folder, and a name in it
+  bool sees_changes_ = true;                       ///< of all files
   UniqueFd inotify_;
   UniqueFd wake_;
 };

@@ -7,13 +7,10 @@
 #include <cstring>
 #include <memory>
 
-#include <kova/content_extract.h>
-
 #include "common/error.h"
 #include "common/file_util.h"
 #include "common/log.h"
 #include "common/unique_fd.h"
-#include "services/fileindexd/comparison.h"
 #include "services/fileindexd/file_count.h"
 
 namespace ferrox::indexd {
@@ -26,16 +23,15 @@ constexpr auto kCommitInterval = std::chrono::seconds(5);
 /// A comparison that has seen so many files tells how many there are.
 constexpr uint64_t kFilesBeforeCount = 500;
 
-bool IsCurrent(const IndexedEntry& indexed, const struct stat& status) {
-  return indexed.stamp == KOVA::CONTENT_EXTRACT::Stamp(status);
-}
-
-enum class Presence { kThere, kGone, kUnknown };
-
-/// What is at `path` for the index: links count as nothing.
-Presence LookAt(const std::string& path, struct stat& status) {
-  if (lstat(path.c_str(), &status) == 0) return S_ISLNK(status.st_mode) ? Presence::kGone : Presence::kThere;
-  return errno == ENOENT || errno == ENOTDIR || errno == ELOOP ? Presence::kGone : Presence::kUnknown;
+/// The shallowest folder at or above `path` that does not hold `root`; "" when the path itself does.
+std::string TopBeside(const std::string& path, const std::string& root) {
+  size_t end = 0;
+  do {
+    end = path.find('/', end + 1);
+    const std::string top = path.substr(0, end);
+    if (!StringStartWith(root + "/", top + "/")) return top;
+  } while (end != std::string::npos);
+  return "";
 }
 
 }  // namespace
@@ -47,21 +43,25 @@ struct OperationRunner::Handler {
   Function look;
 };
 
-/// Until kinds can be switched off per folder, a changed configuration asks for nothing that a comparison does not do.
 constexpr OperationRunner::Handler OperationRunner::kHandlers[] = {
     {fileindex::OP_DELETE, &OperationRunner::MoveDelete, &OperationRunner::LookDelete},
     {fileindex::OP_UPSERT, nullptr, &OperationRunner::LookUpsert},
     {fileindex::OP_ATTR, nullptr, &OperationRunner::LookAttr},
-    {fileindex::OP_UPDATE_CFG, nullptr, &OperationRunner::LookReindex},
+    {fileindex::OP_UPDATE_CFG, nullptr, &OperationRunner::LookUpdateCfg},
     {fileindex::OP_RENAME, &OperationRunner::MoveRename, &OperationRunner::LookRename},
     {fileindex::OP_REINDEX, nullptr, &OperationRunner::LookReindex},
     {fileindex::OP_FULL_REINDEX, nullptr, &OperationRunner::LookFullReindex},
 };
 
 OperationRunner::OperationRunner(const PassContext& context)
-    : context_(context), rules_(context.share, context.root), tasks_(context.pool, context.interruption) {}
+    : context_(context),
+      rules_(context.share, context.root, context.folders),
+      writer_(context.index, context.folders, context.status),
+      mover_(context_.root, context.index, context.folders, rules_, writer_),
+      tasks_(context.pool, context.interruption) {}
 
-void OperationRunner::Run(const std::function<void(const std::function<void(const fileindex::OP&)>&)>& each) {
+void OperationRunner::Run(const std::function<void(const std::function<void(const fileindex::OP&)>&)>& each,
+                          const std::vector<std::string>& also_compare) {
   uint64_t operations = 0;
   each([&operations](const fileindex::OP&) { ++operations; });
   context_.status.BeginPass(operations);
@@ -71,6 +71,7 @@ void OperationRunner::Run(const std::function<void(const std::function<void(cons
     CarryOut(op, Stage::kLook);
     context_.status.OperationDone();
   });
+  for (const std::string& path : also_compare) CompareOnce(path);
   tasks_.Wait();
   Commit();
 }
@@ -94,7 +95,7 @@ void OperationRunner::CarryOut(const fileindex::OP& op, Stage stage) {
 
 void OperationRunner::KeepWhatIsDone() noexcept {
   try {
-    if (uncommitted_) Commit();
+    if (writer_.HasUncommitted()) Commit();
   } catch (const std::exception&) {
     // What is not committed is done again when the queue is taken up again.
   }
@@ -102,152 +103,73 @@ void OperationRunner::KeepWhatIsDone() noexcept {
 
 /// What has been written becomes searchable and safe while a long pass goes on.
 void OperationRunner::CommitIfDue() {
-  if (!uncommitted_ || std::chrono::steady_clock::now() - last_commit_ < kCommitInterval) return;
+  if (!writer_.HasUncommitted() || std::chrono::steady_clock::now() - last_commit_ < kCommitInterval) return;
   Commit();
 }
 
 void OperationRunner::Commit() {
-  uncommitted_ = false;
-  context_.index.Commit();
-  context_.status.Committed();
+  writer_.Commit();
   last_commit_ = std::chrono::steady_clock::now();
 }
 
 void OperationRunner::MoveDelete(const std::string& path, const std::string&) {
   struct stat status = {};
   if (LookAt(path, status) != Presence::kGone) return;
-  tasks_.Submit([this, path] { RemoveTree(path); });
+  tasks_.Submit([this, path] { writer_.RemoveTree(path); });
 }
 
-/// The documents are moved only to spare reading the files again: both places are compared afterwards. Later renames
-/// have carried the earlier ones along in the queue, which then no longer tells what happened (two folders that were
-/// swapped, for example), and an earlier pass may have seen the disk as it is now.
 void OperationRunner::MoveRename(const std::string& path, const std::string& old_path) {
   tasks_.Wait();
-  const bool within = path != old_path && path != context_.root && StringStartWith(old_path, context_.root + "/");
-  if (!within || !rules_.CanBeIndexed(path) || !rules_.CanBeIndexed(old_path)) return;
-  if (!HoldsDocumentsOf(old_path, path)) return;
-  uncommitted_ = true;
-  try {
-    context_.index.Rename(path, old_path);
-  } catch (const Error& error) {
-    if (error.Code() != Error::kEngineNoSuchDocument) throw;
-  }
+  mover_.Move(path, old_path);
 }
 
-/// Whether what the index has at the old path is what is at the new one now. When that has gone on to yet another
-/// place, a later rename will tell; the documents are its, unless there is something new at the old path.
-bool OperationRunner::HoldsDocumentsOf(const std::string& old_path, const std::string& path) {
-  using namespace KOVA::CONTENT_EXTRACT;  // NOLINT: its functions of stamps
-  struct stat status = {};
-  const auto indexed = context_.index.Find(old_path);
-  if (indexed.empty()) return false;
-  if (LookAt(path, status) == Presence::kThere) return SameFile(indexed.front().stamp, Stamp(status));
-  return LookAt(old_path, status) == Presence::kGone;
-}
-
-/// What is there again is compared: of a file that a folder has replaced, the queue keeps the delete alone.
+/// What is there again is compared: of a file that a folder has replaced, the queue keeps the delete alone. A reindex
+/// that came behind it is gone from the queue, too.
 void OperationRunner::LookDelete(const std::string& path, const std::string&) {
   struct stat status = {};
-  if (LookAt(path, status) != Presence::kGone) Compare(path);
+  if (LookAt(path, status) == Presence::kGone) return;
+  had_reindex_ = true;
+  Compare(path);
 }
 
 void OperationRunner::LookRename(const std::string& path, const std::string& old_path) {
   if (path != context_.root && rules_.CanBeIndexed(path)) {
-    tasks_.Submit([this, path, old_path] { RefreshRenamed(path, old_path); });
+    tasks_.Submit([this, path, old_path] { writer_.RefreshRenamed(path, old_path); });
   }
-  if (StringStartWith(old_path, context_.root + "/")) LookReindex(old_path, "");
-  LookReindex(path, "");
+  if (StringStartWith(old_path, context_.root + "/")) CompareOnce(old_path);
+  CompareOnce(path);
 }
 
 void OperationRunner::LookUpsert(const std::string& path, const std::string&) {
   if (path == context_.root) return;
   const bool wanted = rules_.CanBeIndexed(path);
-  tasks_.Submit([this, path, wanted] { wanted ? Write(path) : Remove(path); });
+  tasks_.Submit([this, path, wanted] { wanted ? writer_.Write(path) : writer_.Remove(path); });
 }
 
 void OperationRunner::LookAttr(const std::string& path, const std::string&) {
   if (path == context_.root) return;
-  if (!rules_.CanBeIndexed(path)) {
-    tasks_.Submit([this, path] { Remove(path); });
+  const Place place = rules_.PlaceOf(path);
+  if (place == Place::kOutside) {
+    tasks_.Submit([this, path] { writer_.Remove(path); });
   } else if (BecameReadable(path)) {
     Compare(path);
-  } else {
-    tasks_.Submit([this, path] { RefreshAttributes(path); });
+  } else if (place == Place::kIndexed) {
+    tasks_.Submit([this, path] { writer_.RefreshAttributes(path); });
   }
 }
 
-/// A folder that is copied leaves a reindex for each of its subfolders. All changes of this queue are older than its
-/// first comparison, so what was compared once need not be again.
+/// The kinds that the operation names are of no use: documents tell which content they hold, so that only those differ
+/// whose kind was switched, also after a change whose event was lost.
+void OperationRunner::LookUpdateCfg(const std::string& path, const std::string&) { CompareOnce(path); }
+
 void OperationRunner::LookReindex(const std::string& path, const std::string&) {
-  for (std::string folder = path; folder.size() >= context_.root.size(); folder = Dirname(folder)) {
-    if (compared_.count(folder) != 0) return;
-  }
-  Compare(path);
-  compared_.insert(path);
+  had_reindex_ = true;
+  CompareOnce(path);
 }
 
-void OperationRunner::LookFullReindex(const std::string&, const std::string&) { Compare(context_.root); }
-
-void OperationRunner::Write(const std::string& path) {
-  struct stat status = {};
-  if (LookAt(path, status) == Presence::kGone) return Remove(path);
-  try {
-    uncommitted_ = true;
-    context_.index.Upsert(path, !S_ISDIR(status.st_mode));
-    context_.status.DocumentsWritten(1);
-  } catch (const Error& error) {
-    RecordFailure(error, path);
-  }
-}
-
-/// The attributes alone are refreshed when that cannot make an old content look like a new one.
-void OperationRunner::RefreshAttributes(const std::string& path) {
-  using KOVA::CONTENT_EXTRACT::SameContent;
-  struct stat status = {};
-  if (LookAt(path, status) == Presence::kGone) return Remove(path);
-  const auto indexed = context_.index.Find(path);
-  const bool same = !indexed.empty() && SameContent(indexed.front().stamp, KOVA::CONTENT_EXTRACT::Stamp(status));
-  if (!same) return Write(path);
-  try {
-    uncommitted_ = true;
-    context_.index.Attr(path);
-    context_.status.DocumentsWritten(1);
-  } catch (const Error& error) {
-    if (error.Code() == Error::kEngineNoSuchDocument) return Write(path);
-    RecordFailure(error, path);
-  }
-}
-
-/// A rename changes the moved entry itself, and with another extension the way in which its content is read. When it
-/// is gone already, a later operation knows its present place and still needs the document.
-void OperationRunner::RefreshRenamed(const std::string& path, const std::string& old_path) {
-  struct stat status = {};
-  if (LookAt(path, status) != Presence::kThere) return;
-  const bool same_kind = GetFileExtension(path, true) == GetFileExtension(old_path, true);
-  same_kind ? RefreshAttributes(path) : Write(path);
-}
-
-/// Called while an error is handled: goes on when it is the file's, passes it on when it is the engine's.
-void OperationRunner::RecordFailure(const Error& error, const std::string& path) {
-  struct stat status = {};
-  if (error.Code() == Error::kParseFailed) {
-    if (LookAt(path, status) == Presence::kGone) return Remove(path);
-    return context_.status.AddFailure("cannot be examined", path);
-  }
-  if (error.Code() != Error::kEngineBadRequest) throw;
-  context_.status.AddFailure(error.what(), path);
-}
-
-void OperationRunner::Remove(const std::string& path) {
-  uncommitted_ = true;
-  context_.index.Delete(path);
-  context_.status.DocumentsDeleted(1);
-}
-
-void OperationRunner::RemoveTree(const std::string& path) {
-  Remove(path);
-  context_.index.DeleteBelow(path);
+void OperationRunner::LookFullReindex(const std::string&, const std::string&) {
+  had_reindex_ = true;
+  Compare(context_.root);
 }
 
 /// Whether a folder can be read of which the index knows no content: its permissions may just have been opened.
@@ -256,30 +178,68 @@ bool OperationRunner::BecameReadable(const std::string& folder) {
   return opened.Valid() && context_.index.List(folder, "", 1).empty();
 }
 
+/// A folder that is copied leaves a reindex for each of its subfolders. All changes of this queue are older than its
+/// first comparison, so what was compared once need not be again.
+void OperationRunner::CompareOnce(const std::string& path) {
+  for (std::string folder = path; folder.size() >= context_.root.size(); folder = Dirname(folder)) {
+    if (compared_.count(folder) != 0) return;
+  }
+  Compare(path);
+  compared_.insert(path);
+}
+
 void OperationRunner::Compare(const std::string& path) {
   tasks_.Wait();
-  if (path != context_.root) {
-    if (!StringStartWith(path, context_.root + "/")) return;
-    struct stat status = {};
-    const Presence presence = LookAt(path, status);
-    if (presence == Presence::kUnknown) {
-      return context_.status.AddFailure(std::string("cannot be examined: ") + strerror(errno), path);
-    }
-    if (presence == Presence::kGone || !rules_.CanBeIndexed(path)) return RemoveTree(path);
-    CompareOne(path, status);
-    if (!S_ISDIR(status.st_mode)) return context_.index.DeleteBelow(path);
+  if (path == context_.root) return CompareRoot();
+  if (!StringStartWith(path, context_.root + "/")) return;
+  if (context_.folders.PlaceOf(path) == Place::kOutside) return writer_.RemoveTree(path);
+  struct stat status = {};
+  const Presence presence = LookAt(path, status);
+  if (presence == Presence::kUnknown) {
+    return context_.status.AddFailure(std::string("cannot be examined: ") + strerror(errno), path);
   }
+  const Place place = rules_.PlaceOf(path);
+  if (presence == Presence::kGone || place == Place::kOutside) return writer_.RemoveTree(path);
+  CompareOne(path, place, status);
+  if (!S_ISDIR(status.st_mode)) return context_.index.DeleteBelow(path);
   CompareFolder(path);
 }
 
-void OperationRunner::CompareOne(const std::string& path, const struct stat& status) {
+void OperationRunner::CompareRoot() {
+  RemoveOutsideRoot();
+  CompareFolder(context_.root);
+}
+
+/// After the share was renamed or moved, what could not be taken along is left behind under the old name.
+void OperationRunner::RemoveOutsideRoot() {
+  const std::string& root = context_.root;
+  const std::string behind = root + "0";  // "0" follows "/": no path below the root comes behind it
+  const auto first_of = [this](const std::vector<IndexedEntry>& found) {
+    return found.empty() || StringStartWith(found.front().path, context_.root + "/") ? "" : found.front().path;
+  };
+  while (true) {
+    std::string stray = first_of(context_.index.List("", "", 1));
+    if (stray.empty()) stray = first_of(context_.index.Find(behind));
+    if (stray.empty()) stray = first_of(context_.index.List("", behind, 1));
+    if (stray.empty()) return;
+    context_.interruption.Check();
+    const std::string top = TopBeside(stray, root);
+    top.empty() ? writer_.Remove(stray) : writer_.RemoveTree(top);
+  }
+}
+
+void OperationRunner::CompareOne(const std::string& path, Place place, const struct stat& status) {
   const auto indexed = context_.index.Find(path);
-  if (!indexed.empty() && IsCurrent(indexed.front(), status)) return;
-  tasks_.Submit([this, path] { Write(path); });
+  if (place == Place::kOnTheWay) {
+    if (!indexed.empty()) writer_.Remove(path);
+  } else if (indexed.empty() || !writer_.IsCurrent(indexed.front(), status)) {
+    tasks_.Submit([this, path] { writer_.Write(path); });
+  }
 }
 
 void OperationRunner::CompareFolder(const std::string& folder) {
   WalkRules walk_rules;
+  walk_rules.place_of = [this](const std::string& path) { return context_.folders.PlaceOf(path); };
   walk_rules.skip_name = &PathRules::SkipName;
   walk_rules.may_enter = [this](const std::string& path, const struct stat& status, dev_t device) {
     return rules_.MayEnter(path, status, device);
@@ -299,14 +259,19 @@ void OperationRunner::CompareFolder(const std::string& folder) {
 
 ComparisonActions OperationRunner::Actions(const std::string& folder) {
   ComparisonActions actions;
-  actions.is_current = &IsCurrent;
-  actions.write = [this](const std::string& path, const struct stat&) { tasks_.Submit([this, path] { Write(path); }); };
-  actions.remove = [this](const std::string& path) { tasks_.Submit([this, path] { Remove(path); }); };
+  actions.is_current = [this](const IndexedEntry& indexed, const struct stat& status) {
+    return writer_.IsCurrent(indexed, status);
+  };
+  actions.write = [this](const std::string& path, const struct stat&) {
+    tasks_.Submit([this, path] { writer_.Write(path); });
+  };
+  actions.remove = [this](const std::string& path) { tasks_.Submit([this, path] { writer_.Remove(path); }); };
   const auto count = std::make_shared<std::unique_ptr<FileCount>>();
   actions.examined = [this, folder, count, examined = uint64_t{0}]() mutable {
     context_.interruption.Check();
     context_.status.FileExamined();
-    if (++examined == kFilesBeforeCount) *count = std::make_unique<FileCount>(folder, context_.status);
+    if (++examined == kFilesBeforeCount)
+      *count = std::make_unique<FileCount>(folder, context_.folders, context_.status);
     CommitIfDue();
   };
   return actions;

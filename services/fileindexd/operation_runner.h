@@ -2,17 +2,19 @@
 
 #include <sys/stat.h>
 
-#include <atomic>
 #include <chrono>
 #include <functional>
 #include <set>
 #include <string>
+#include <vector>
 
-#include "common/error.h"
 #include "fileindex/optree.h"
 #include "services/fileindexd/comparison.h"
+#include "services/fileindexd/document_mover.h"
+#include "services/fileindexd/document_writer.h"
 #include "services/fileindexd/interruption.h"
 #include "services/fileindexd/path_rules.h"
+#include "services/fileindexd/share_folders.h"
 #include "services/fileindexd/share_index.h"
 #include "services/fileindexd/share_status.h"
 #include "services/fileindexd/task_pool.h"
@@ -23,6 +25,7 @@ namespace ferrox::indexd {
 struct PassContext {
   const std::string& share;
   const std::string& root;  ///< the share's folder
+  const ShareFolders& folders;
   ShareIndex& index;
   TaskPool& pool;
   const Interruption& interruption;
@@ -38,14 +41,20 @@ class OperationRunner {
  public:
   explicit OperationRunner(const PassContext& context);
 
-  /// Carries out what `each` hands over; it is called several times and hands over the same each time.
+  /// Carries out what `each` hands over (it is called several times and hands over the same each time), and compares
+  /// the paths `also_compare`.
   /// @return after a durable commit. @throws Interrupted; Error when the index cannot be written: the pass is then to
   /// be tried again.
-  void Run(const std::function<void(const std::function<void(const fileindex::OP&)>&)>& each);
+  void Run(const std::function<void(const std::function<void(const fileindex::OP&)>&)>& each,
+           const std::vector<std::string>& also_compare);
   /// Commits what has been done, as far as that works at once. For a pass that ends early.
   void KeepWhatIsDone() noexcept;
 
+  /// Whether the queue held a reindex, which keeps the library from queuing what concerns the paths below it.
+  bool HadReindex() const { return had_reindex_; }
+
  private:
+  using Place = PathRules::Place;
   struct Handler;
   static const Handler kHandlers[];
   enum class Stage { kMove, kLook };
@@ -56,6 +65,7 @@ class OperationRunner {
   void LookRename(const std::string& path, const std::string& old_path);
   void LookUpsert(const std::string& path, const std::string& old_path);
   void LookAttr(const std::string& path, const std::string& old_path);
+  void LookUpdateCfg(const std::string& path, const std::string& old_path);
   void LookReindex(const std::string& path, const std::string& old_path);
   void LookFullReindex(const std::string& path, const std::string& old_path);
 
@@ -63,26 +73,22 @@ class OperationRunner {
   void CommitIfDue();
   void Commit();
 
-  // Carried out by the pool's threads.
-  void Write(const std::string& path);
-  void RefreshAttributes(const std::string& path);
-  void RefreshRenamed(const std::string& path, const std::string& old_path);
-  void Remove(const std::string& path);
-  void RemoveTree(const std::string& path);
-  void RecordFailure(const Error& error, const std::string& path);
-
-  bool HoldsDocumentsOf(const std::string& old_path, const std::string& path);
   bool BecameReadable(const std::string& folder);
+  void CompareOnce(const std::string& path);
   void Compare(const std::string& path);
-  void CompareOne(const std::string& path, const struct stat& status);
+  void CompareRoot();
+  void RemoveOutsideRoot();
+  void CompareOne(const std::string& path, Place place, const struct stat& status);
   void CompareFolder(const std::string& folder);
   ComparisonActions Actions(const std::string& folder);
 
   PassContext context_;
   PathRules rules_;
+  DocumentWriter writer_;
+  DocumentMover mover_;
   TaskGroup tasks_;
   std::set<std::string> compared_;
-  std::atomic<bool> uncommitted_{false};
+  bool had_reindex_ = false;
   std::chrono::steady_clock::time_point last_commit_ = std::chrono::steady_clock::now();
 };
 

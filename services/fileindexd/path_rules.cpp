@@ -35,40 +35,45 @@ bool AskAllRules(const std::string& folder) {
 
 }  // namespace
 
-PathRules::PathRules(const std::string& share, const std::string& root) : share_(share), root_(root) {}
-
-std::string PathRules::ShareProblem() const {
+std::string ShareProblem(const std::string& share, const std::string& root) {
   struct stat status = {};
-  if (stat(root_.c_str(), &status) != 0 || !S_ISDIR(status.st_mode)) {
-    return "its folder " + root_ + " is not there; mount it, or remove the share";
+  if (stat(root.c_str(), &status) != 0 || !S_ISDIR(status.st_mode)) {
+    return "its folder " + root + " is not there; mount it, or remove the share";
   }
-  const int type = KOVAGetFSType(root_.c_str(), 0);
-  if (type < 0 || type == KOVA_FS_PSEUDO) return root_ + " lies on a file system that holds no files of users";
-  if (KOVAFSIsRemoteFS(type) != 0) return root_ + " lies on another machine; index it there";
-  if (KOVAFSIsImageFS(type) != 0) return root_ + " is a mounted image, which is not indexed";
-  if (RealPath(root_) != root_) return root_ + " leads through a link; give the share its real folder";
-  if (!sdk::SDKShare(share_).CanBeIndexed()) return "the share is locked or read-only";
+  const int type = KOVAGetFSType(root.c_str(), 0);
+  if (type < 0 || type == KOVA_FS_PSEUDO) return root + " lies on a file system that holds no files of users";
+  if (KOVAFSIsRemoteFS(type) != 0) return root + " lies on another machine; index it there";
+  if (KOVAFSIsImageFS(type) != 0) return root + " is a mounted image, which is not indexed";
+  if (RealPath(root) != root) return root + " leads through a link; give the share its real folder";
+  if (!sdk::SDKShare(share).CanBeIndexed()) return "the share is locked or read-only";
   return "";
 }
 
+PathRules::PathRules(const std::string& share, const std::string& root, const ShareFolders& folders)
+    : share_(share), root_(root), folders_(folders) {}
+
 bool PathRules::SkipName(const std::string& name) { return fileindex::IsSystemPreservedFileName(name); }
 
-bool PathRules::CanBeIndexed(const std::string& path) {
-  if (path == root_) return true;
-  if (!StringStartWith(path, root_ + "/")) return false;
-  struct stat status = {};
-  const bool is_folder = lstat(path.c_str(), &status) == 0 && S_ISDIR(status.st_mode);
-  return is_folder ? FolderCanBeIndexed(path) : !SkipName(Basename(path)) && FolderCanBeIndexed(Dirname(path));
+PathRules::Place PathRules::PlaceOf(const std::string& path) {
+  const Place place = folders_.PlaceOf(path);
+  return place == Place::kOutside || IsLeftOut(path) ? Place::kOutside : place;
 }
 
-bool PathRules::FolderCanBeIndexed(const std::string& folder) {
-  if (folder == root_) return true;
-  const auto known = folders_.find(folder);
-  if (known != folders_.end()) return known->second;
-  const std::string parent = Dirname(folder);
-  const bool answer = FolderCanBeIndexed(parent) && !SkipName(Basename(folder)) && AskAllRules(folder);
-  if (folders_.size() >= kFoldersRemembered) folders_.clear();
-  folders_[folder] = answer;
+bool PathRules::IsLeftOut(const std::string& path) {
+  if (path == root_) return false;
+  if (!StringStartWith(path, root_ + "/")) return true;
+  struct stat status = {};
+  const bool is_folder = lstat(path.c_str(), &status) == 0 && S_ISDIR(status.st_mode);
+  return is_folder ? FolderIsLeftOut(path) : SkipName(Basename(path)) || FolderIsLeftOut(Dirname(path));
+}
+
+bool PathRules::FolderIsLeftOut(const std::string& folder) {
+  if (folder == root_) return false;
+  const auto known = left_out_.find(folder);
+  if (known != left_out_.end()) return known->second;
+  const bool answer = FolderIsLeftOut(Dirname(folder)) || SkipName(Basename(folder)) || !AskAllRules(folder);
+  if (left_out_.size() >= kFoldersRemembered) left_out_.clear();
+  left_out_[folder] = answer;
   return answer;
 }
 

@@ -5,30 +5,40 @@
 #include <map>
 #include <string>
 
+#include "services/fileindexd/share_folders.h"
+
 namespace ferrox::indexd {
 
-/// Decides which paths of one share are indexed, asking the costly questions (file system, share, recycle bin, mount
-/// point, canonical path) once per folder or device instead of once per file. Made per pass; belongs to one thread.
+/// Why nothing of the share, whose folder is `root`, can be indexed now, "" when it can. @throws Error kNoSuchShare;
+/// kInternal.
+std::string ShareProblem(const std::string& share, const std::string& root);
+
+/// Decides which paths of one share are indexed: those under its indexed folders, unless the rules for names and places
+/// leave them out. Asks the costly questions (file system, share, recycle bin, mount point, canonical path) once per
+/// folder or device instead of once per file. Made per pass; belongs to one thread.
 class PathRules {
  public:
-  /// `root` is the share's folder. @throws Error kNoSuchShare; kInternal.
-  PathRules(const std::string& share, const std::string& root);
+  using Place = ShareFolders::Place;
 
-  /// Why nothing of the share can be indexed now, "" when it can.
-  std::string ShareProblem() const;
-  /// Whether the path, at or below the root, may be indexed by its name and place. Nothing need exist there.
-  bool CanBeIndexed(const std::string& path);
+  /// `root` is the share's folder; `folders` outlive the rules.
+  PathRules(const std::string& share, const std::string& root, const ShareFolders& folders);
+
+  /// What the path, at or below the root, is for the index by its name and place. Nothing need exist there.
+  Place PlaceOf(const std::string& path);
+  bool CanBeIndexed(const std::string& path) { return PlaceOf(path) == Place::kIndexed; }
   /// Whether a name is never indexed, nor anything below it.
   static bool SkipName(const std::string& name);
   /// Whether a walk that is in a folder on `parent_device` may enter the folder `path`.
   bool MayEnter(const std::string& path, const struct stat& status, dev_t parent_device) const;
 
  private:
-  bool FolderCanBeIndexed(const std::string& folder);
+  bool IsLeftOut(const std::string& path);
+  bool FolderIsLeftOut(const std::string& folder);
 
   std::string share_;
   std::string root_;
-  std::map<std::string, bool> folders_;
+  const ShareFolders& folders_;
+  std::map<std::string, bool> left_out_;
 };
 
 }  // namespace ferrox::indexd

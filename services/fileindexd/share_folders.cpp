@@ -1,32 +1,22 @@
 #include "services/fileindexd/share_folders.h"
 
-#include "common/error.h"
 #include "common/file_util.h"
+#include "common/paths.h"
 #include "fileindex/folder_mgr.h"
 #include "fileindex/util.h"
 
 namespace ferrox::indexd {
 
-namespace {
-
-/// "" for an entry that names no share, as only a file written by hand has it.
-std::string ShareOf(const fileindex::Folder& folder) {
-  try {
-    return folder.GetShare();
-  } catch (const Error&) {
-    return "";
-  }
-}
-
-}  // namespace
-
 ShareFolders ShareFolders::Load(const std::string& share, const std::string& root) {
   ShareFolders loaded;
+  // Until folders can be added, a share is indexed whole.
+  if (!IsFileExist(InstancePath(kFileIndexFoldersCfgPath))) loaded.kinds_[root] = {true, true, true, true};
   const fileindex::FolderMgr folder_mgr;
   for (const auto& folder : folder_mgr.GetFolders()) {
-    if (ShareOf(*folder) != share) continue;
+    const std::string& path = folder->GetPath();
+    if (!StringStartWith(path + "/", "/" + share + "/")) continue;
     // Of a path that stands twice, the first counts.
-    (void)loaded.kinds_.emplace(root + folder->GetPath().substr(1 + share.size()),
+    (void)loaded.kinds_.emplace(root + path.substr(1 + share.size()),
                                 Kinds{folder->IsDocument(), folder->IsAudio(), folder->IsVideo(), folder->IsPhoto()});
   }
   return loaded;
@@ -56,8 +46,8 @@ bool ShareFolders::WantsContent(const std::string& full_path) const {
 
 std::vector<std::string> ShareFolders::TopmostBelow(const std::string& full_path) const {
   std::vector<std::string> topmost;
-  for (auto at = kinds_.lower_bound(full_path + "/");
-       at != kinds_.end() && StringStartWith(at->first, full_path + "/"); ++at) {
+  for (auto at = kinds_.lower_bound(full_path + "/"); at != kinds_.end() && StringStartWith(at->first, full_path + "/");
+       ++at) {
     if (Governing(Dirname(at->first)) == nullptr) topmost.push_back(at->first);
   }
   return topmost;

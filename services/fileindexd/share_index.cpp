@@ -18,11 +18,13 @@ namespace elastic = fileindex::elastic;
 constexpr std::chrono::seconds kFiguresWait(2);
 constexpr char kPathField[] = "KOVAMDPath";
 constexpr char kStampField[] = "_KOVAStamp";
+constexpr char kNeedMetaField[] = "_KOVANeedMeta";
 
 IndexedEntry ToEntry(const Json::Value& fields) {
   IndexedEntry entry;
   GetJsonValue(entry.path, fields, kPathField, true);
   GetJsonValue(entry.stamp, fields, kStampField, false);
+  GetJsonValue(entry.with_content, fields, kNeedMetaField, false);
   return entry;
 }
 
@@ -95,7 +97,7 @@ class Engine : public ShareIndex {
   }
 
   std::vector<IndexedEntry> Query(Json::Value query) const {
-    for (const char* field : {kPathField, kStampField}) query["load_field"].append(field);
+    for (const char* field : {kPathField, kStampField, kNeedMetaField}) query["load_field"].append(field);
     Json::Value request = Request("document_get_by_query");
     request["data"]["query"] = std::move(query);
     Json::Value reply;

@@ -12,6 +12,7 @@ namespace ferrox::indexd {
 struct IndexedEntry {
   std::string path;
   std::string stamp;
+  bool with_content = false;  ///< whether its content was wanted when it was written
 };
 
 /// One share's index, as the daemon's work needs it; every call may throw what the engine's commands do. Several

@@ -1,5 +1,6 @@
 #include "services/fileindexd/share_status.h"
 
+#include <algorithm>
 #include <chrono>
 
 #include "common/clock.h"
@@ -23,6 +24,26 @@ int64_t SteadyMilliseconds() {
 }
 
 }  // namespace
+
+void Rate::Count(int64_t now_ms) {
+  const int64_t second = now_ms / 1000;
+  Bucket& bucket = buckets_[static_cast<size_t>(second % kSeconds)];
+  if (bucket.second != second) bucket = {second, 0};
+  ++bucket.count;
+}
+
+/// Counted from the first of those seconds in which there was one, so that a rate does not sag at its beginning.
+double Rate::PerSecond(int64_t now_ms) const {
+  uint64_t sum = 0;
+  int64_t since_ms = now_ms;
+  for (const Bucket& bucket : buckets_) {
+    if (bucket.second <= now_ms / 1000 - kSeconds) continue;
+    sum += bucket.count;
+    since_ms = std::min(since_ms, bucket.second * 1000);
+  }
+  return sum == 0 ? 0
+                  : static_cast<double>(sum) * 1000 / static_cast<double>(std::max<int64_t>(now_ms - since_ms, 1000));
+}
 
 void ShareStatus::SetState(State state, const std::string& detail) {
   const std::lock_guard lock(mutex_);
@@ -75,6 +96,12 @@ void ShareStatus::SetEstimate(uint64_t files, bool complete) {
   estimate_complete_ = complete;
 }
 
+void ShareStatus::DocumentWritten() {
+  const std::lock_guard lock(mutex_);
+  ++written_;
+  rate_.Count(SteadyMilliseconds());
+}
+
 void ShareStatus::AddFailure(const std::string& reason, const std::string& path) {
   const std::lock_guard lock(mutex_);
   const bool known = failures_.count(reason) != 0 || failures_.size() < kReasonsKept;
@@ -108,10 +135,14 @@ Json::Value ShareStatus::ToJson() const {
   comparison["estimate_complete"] = estimate_complete_;
   comparison["elapsed_ms"] =
       Json::Int64((comparing_ ? SteadyMilliseconds() : comparison_ended_ms_) - comparison_began_ms_);
+  json["rate"] = rate_.PerSecond(SteadyMilliseconds());
   json["written"] = Json::UInt64(written_);
   json["deleted"] = Json::UInt64(deleted_);
   json["links_skipped"] = Json::UInt64(links_skipped_);
   if (last_commit_ != 0) json["last_commit"] = Json::Int64(last_commit_);
+  uint64_t failed = 0;
+  for (const auto& [reason, failure] : failures_) failed += failure.count;
+  json["failed"] = Json::UInt64(failed);
   json["failures"] = Json::Value(Json::objectValue);
   for (const auto& [reason, failure] : failures_) {
     Json::Value& entry = json["failures"][reason];

@@ -1,5 +1,6 @@
 #pragma once
 
+#include <array>
 #include <cstdint>
 #include <map>
 #include <mutex>
@@ -9,6 +10,21 @@
 #include <json/value.h>
 
 namespace ferrox::indexd {
+
+/// How many a second there were, over the last ten seconds.
+class Rate {
+ public:
+  void Count(int64_t now_ms);
+  double PerSecond(int64_t now_ms) const;
+
+ private:
+  static constexpr int64_t kSeconds = 10;
+  struct Bucket {
+    int64_t second = -kSeconds;
+    uint64_t count = 0;
+  };
+  std::array<Bucket, kSeconds> buckets_;
+};
 
 /// What people can see of one share's indexing. Every call is safe from any thread.
 class ShareStatus {
@@ -30,8 +46,8 @@ class ShareStatus {
   void FileExamined();
   void SetEstimate(uint64_t files, bool complete);
 
-  void DocumentsWritten(uint64_t count) { Add(written_, count); }
-  void DocumentsDeleted(uint64_t count) { Add(deleted_, count); }
+  void DocumentWritten();
+  void DocumentDeleted() { Add(deleted_, 1); }
   void LinksSkipped(uint64_t count) { Add(links_skipped_, count); }
   /// A file that could not be indexed as it should; it did not stop the work.
   void AddFailure(const std::string& reason, const std::string& path);
@@ -60,6 +76,7 @@ class ShareStatus {
   uint64_t estimate_ = 0;
   bool estimate_complete_ = false;
   uint64_t written_ = 0;
+  Rate rate_;
   uint64_t deleted_ = 0;
   uint64_t links_skipped_ = 0;
   int64_t last_commit_ = 0;

@@ -12,7 +12,9 @@
 #include "common/clock.h"
 #include "common/error.h"
 #include "common/file_util.h"
+#include "common/lock_file.h"
 #include "common/log.h"
+#include "common/paths.h"
 #include "common/unique_fd.h"
 #include "fileindex/optree.h"
 #include "fileindex/queue_mgr.h"
@@ -20,6 +22,7 @@
 #include "fileindex/util.h"
 #include "sdk/share.h"
 #include "services/fileindexd/operation_runner.h"
+#include "services/fileindexd/path_rules.h"
 
 namespace ferrox::indexd {
 
@@ -29,8 +32,6 @@ using fileindex::StatusMgr;
 using std::chrono::milliseconds;
 using std::chrono::seconds;
 
-/// A queue that has just changed is left for so long, since changes seldom come alone.
-constexpr milliseconds kGatherTime(100);
 /// The queue is looked at again after so long, whether or not it was seen to change.
 constexpr seconds kSlowTimer(30);
 constexpr seconds kSlowTimerWithoutWatch(2);
@@ -92,7 +93,7 @@ ShareWorker::ShareWorker(const std::string& share, const Environment& environmen
       queue_path_(sdk::SDKShare(share).GetQueuePath()),
       environment_(environment),
       index_(environment.open_index(share)),
-      watch_(queue_path_) {}
+      watch_({queue_path_}) {}
 
 ShareWorker::~ShareWorker() {
   stopping_ = true;
@@ -154,6 +155,7 @@ milliseconds ShareWorker::Round() {
 milliseconds ShareWorker::OnFailure(const Error& error) {
   if (std::exchange(last_failure_, error.Code()) != error.Code()) delay_ = milliseconds(0);
   index_exists_ = index_exists_ && error.Code() != Error::kEngineNoSuchIndex;
+  if (error.Code() != Error::kEngineNoSuchIndex) index_missing_since_.reset();
   try {
     if (IsOutOfSpace(error, share_)) return OnNoSpace(error);
   } catch (const Error&) {
@@ -165,8 +167,13 @@ milliseconds ShareWorker::OnFailure(const Error& error) {
     return NextDelay(seconds(1), seconds(30));
   }
   if (error.Code() == Error::kEngineIndexPaused) {
-    status_.SetState(ShareStatus::State::kPaused, "the share's index is paused");
-    return NextDelay(seconds(30), seconds(30));
+    status_.SetState(ShareStatus::State::kPaused,
+                     "the share's index is paused; 'fileindexctl share resume' resumes it");
+    return NextDelay(milliseconds(500), seconds(30));
+  }
+  if (error.Code() == Error::kEngineNoSuchIndex) {
+    status_.SetState(ShareStatus::State::kWaitingForEngine, error.what());
+    return NextDelay(milliseconds(500), seconds(2));
   }
   status_.SetState(ShareStatus::State::kError, std::string(error.what()) + " (" + std::to_string(error.Code()) + ")");
   return NextDelay(seconds(2), seconds(300));
@@ -202,7 +209,7 @@ void ShareWorker::RunOnce() {
     QueueNeededReindex();
     const bool begun_before = IsFileExist(detached);
     if (!begun_before && !HasContent(queue_path_)) break;
-    if (!begun_before) interruption_.SleepFor(kGatherTime);
+    if (!begun_before) interruption_.SleepFor(environment_.gather_time);
     RunPass();
   } while (true);
 }
@@ -211,19 +218,35 @@ void ShareWorker::CheckShare() {
   const sdk::SDKShare share(share_);
   FERROX_FAIL_IF(share.GetPath() != root_, Error::kNoSuchShare, "the share's folder is another one now");
   FERROX_FAIL_IF(told_no_space_ && !share.IsSpaceEnough(), Error::kSpaceNotEnough, "still less than 100 MiB free");
-  const std::string problem = PathRules(share_, root_).ShareProblem();
+  const std::string problem = ShareProblem(share_, root_);
   FERROX_FAIL_IF(!problem.empty(), Error::kPathNotIndexable, problem);
 }
 
-/// A new index has nothing in it: the reindex that fills it is queued before the index exists, so that a crash in
-/// between leaves no empty index that looks finished.
+/// Who adds and removes folders makes and removes the index. Only a lost one is made here, after a while: an index that
+/// is missing may be about to be renamed to this name, or to be gone for good, with its last folder.
 void ShareWorker::EnsureIndex() {
   if (index_exists_) return;
   if (!index_->Exists()) {
-    (void)QueueReindex();
-    index_->Create();
+    const auto now = std::chrono::steady_clock::now();
+    if (!index_missing_since_) index_missing_since_ = now;
+    FERROX_FAIL_IF(now - *index_missing_since_ < environment_.missing_index_patience, Error::kEngineNoSuchIndex,
+                   "the share has no index yet");
+    MakeMissingIndex();
   }
+  index_missing_since_.reset();
   index_exists_ = true;
+}
+
+/// The folders are looked at under their lock, so that no index is made for a share whose last folder is being removed.
+/// A new index has nothing in it: the reindex that fills it is queued before the index exists, so that a crash in
+/// between leaves no empty index that looks finished.
+void ShareWorker::MakeMissingIndex() {
+  const LockFile lock(InstancePath(kFolderLockPath), true);
+  FERROX_FAIL_IF(LoadFolders().Count() == 0, Error::kEngineNoSuchIndex, "the share is not indexed any more");
+  if (index_->Exists()) return;
+  Log(LOG_WARNING, "the index of share %s is gone; it is made anew", share_.c_str());
+  (void)QueueReindex();
+  index_->Create();
 }
 
 /// Turns the share's mark into a queued reindex.
@@ -247,23 +270,53 @@ bool ShareWorker::QueueReindex() {
 void ShareWorker::RunPass() {
   fileindex::QueueMgr queue(queue_path_);
   if (!queue.PrepareTmpQueue() && !IsFileExist(queue_path_ + ".tmp")) return;
-  OperationRunner runner({share_, root_, *index_, environment_.pool, interruption_, status_});
+  // Only now: of folders that are changed later, the events are in a later queue.
+  const ShareFolders folders = LoadFolders();
+  OperationRunner runner({share_, root_, folders, *index_, environment_.pool, interruption_, status_});
+  RunOperations(queue, runner, folders);
+  // What went away in the meantime, with its volume for example, looked as if it had been deleted.
+  CheckShare();
+  QueueAgainIfChanged(runner, folders);
+  queue.DeleteTmp();
+  // While the queue was still there, a change made since may have been taken for one that it covers.
+  QueueAgainIfChanged(runner, folders);
+  last_folders_ = folders;
+  status_.EndPass();
+}
+
+/// Where the folders differ from those of the last pass is compared, too: a reindex that waits in the queue swallows
+/// the event of a folder, or of a user, that was renamed into its place, and so what is to be done at the old one.
+void ShareWorker::RunOperations(fileindex::QueueMgr& queue, OperationRunner& runner, const ShareFolders& folders) {
+  const auto each = [&queue](const std::function<void(const fileindex::OP&)>& take) {
+    (void)queue.ProcessOP([&take](const std::shared_ptr<fileindex::OP>& op) { take(*op); }, true);
+  };
   try {
-    runner.Run([&queue](const std::function<void(const fileindex::OP&)>& take) {
-      (void)queue.ProcessOP([&take](const std::shared_ptr<fileindex::OP>& op) { take(*op); }, true);
-    });
+    runner.Run(each, last_folders_ ? folders.DifferingFrom(*last_folders_) : std::vector<std::string>());
   } catch (const Interrupted&) {
     runner.KeepWhatIsDone();
     throw;
   }
-  queue.DeleteTmp();
-  status_.EndPass();
+}
+
+ShareFolders ShareWorker::LoadFolders() {
+  ShareFolders folders = ShareFolders::Load(share_, root_);
+  folder_count_ = folders.Count();
+  return folders;
+}
+
+/// The library queues nothing below a path whose reindex it sees in the queue, although the folders of this pass may be
+/// those of before the change. The mark is on the disk before the queue is gone.
+void ShareWorker::QueueAgainIfChanged(const OperationRunner& runner, const ShareFolders& folders) {
+  if (!runner.HadReindex() || LoadFolders() == folders) return;
+  StatusMgr().SetShareStatus(share_, StatusMgr::kNeedReindex);
 }
 
 Json::Value ShareWorker::Status() {
   Json::Value json = status_.ToJson();
   json["share"] = share_;
   json["path"] = root_;
+  json["folders"] = Json::UInt64(folder_count_);
+  json["watch"] = "none";  // nothing watches the file systems yet
   // The worker may not have noticed yet that the pause is over.
   const bool pause_over = json["state"] == "paused" && !json.isMember("detail") && !environment_.pause.Paused();
   if (pause_over) json["state"] = "starting";

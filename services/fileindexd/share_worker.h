@@ -5,19 +5,27 @@
 #include <cstdint>
 #include <functional>
 #include <memory>
+#include <optional>
 #include <string>
 #include <thread>
 
 #include <json/value.h>
 
 #include "common/error.h"
+#include "services/fileindexd/file_watch.h"
 #include "services/fileindexd/interruption.h"
-#include "services/fileindexd/queue_watch.h"
+#include "services/fileindexd/share_folders.h"
 #include "services/fileindexd/share_index.h"
 #include "services/fileindexd/share_status.h"
 #include "services/fileindexd/task_pool.h"
 
+namespace ferrox::fileindex {
+class QueueMgr;
+}  // namespace ferrox::fileindex
+
 namespace ferrox::indexd {
+
+class OperationRunner;
 
 /// The pause as all workers see it: seconds since the epoch at which it ends, 0 for a pause without end, -1 for none.
 class PauseState {
@@ -40,6 +48,10 @@ class ShareWorker {
     const PauseState& pause;
     /// The index of a share.
     std::function<std::unique_ptr<ShareIndex>(const std::string& share)> open_index = &EngineShareIndex;
+    /// A queue that has just changed is left for so long, since changes seldom come alone.
+    std::chrono::milliseconds gather_time{100};
+    /// An index that has been missing for so long is made anew; one that is being renamed is missing for a moment.
+    std::chrono::milliseconds missing_index_patience = std::chrono::seconds(5);
   };
 
   /// @throws Error kNoSuchShare; kInternal.
@@ -53,6 +65,9 @@ class ShareWorker {
   void Start();
   /// Looks again at the pause, the queue and the share's settings at once.
   void Wake();
+
+  /// The share's folder when the worker was made; once it is another, this worker is of no use any more.
+  const std::string& Root() const { return root_; }
 
   /// Carries out what is queued now, if anything. @throws Interrupted; Error when it is to be tried again.
   void RunOnce();
@@ -69,9 +84,13 @@ class ShareWorker {
 
   void CheckShare();
   void EnsureIndex();
+  void MakeMissingIndex();
   void QueueNeededReindex();
   bool QueueReindex();
   void RunPass();
+  void RunOperations(fileindex::QueueMgr& queue, OperationRunner& runner, const ShareFolders& folders);
+  ShareFolders LoadFolders();
+  void QueueAgainIfChanged(const OperationRunner& runner, const ShareFolders& folders);
 
   std::string share_;
   std::string root_;
@@ -79,11 +98,14 @@ class ShareWorker {
   Environment environment_;
   std::unique_ptr<ShareIndex> index_;
   bool index_exists_ = false;
+  std::optional<std::chrono::steady_clock::time_point> index_missing_since_;
+  std::optional<ShareFolders> last_folders_;  ///< what the last finished pass went by
+  std::atomic<uint64_t> folder_count_{0};
   int last_failure_ = 0;
   std::chrono::milliseconds delay_{0};  ///< grows while the same failure comes again
   bool told_no_space_ = false;
   ShareStatus status_;
-  QueueWatch watch_;
+  FileWatch watch_;
   Interruption interruption_;
   std::atomic<bool> stopping_{false};
   std::thread thread_;

@@ -25,6 +25,7 @@ struct TreeWalk::Item {
 struct TreeWalk::Level {
   UniqueFd folder;
   dev_t device = 0;
+  bool indexed = false;  ///< the folder, and so all in it; else it is on the way to what is
   std::string prefix;
   std::string names;
   std::vector<Item> items;
@@ -60,7 +61,8 @@ bool IsFolder(int folder, const dirent& entry) {
 
 TreeWalk::TreeWalk(const std::string& folder, const WalkRules& rules) : rules_(rules) {
   Entry entry;
-  if (Descend(AT_FDCWD, folder, folder, entry)) first_ = std::make_unique<Entry>(entry);
+  const bool indexed = rules_.place_of(folder) == Place::kIndexed;
+  if (Descend(AT_FDCWD, folder, folder, indexed, entry)) first_ = std::make_unique<Entry>(entry);
   opened_ = !levels_.empty();
 }
 
@@ -84,19 +86,26 @@ bool TreeWalk::Next(Entry& entry) {
       continue;
     }
     const std::string name = level.Name(item);
-    if (level.not_entered.count(name) != 0) continue;
-    if (Descend(level.folder.Get(), name, level.prefix + name, entry)) return true;
+    const std::string path = level.prefix + name;
+    const Place place = PlaceIn(level, path);
+    if (place == Place::kOutside || level.not_entered.count(name) != 0) continue;
+    if (Descend(level.folder.Get(), name, path, place == Place::kIndexed, entry)) return true;
   }
   return false;
 }
 
-bool TreeWalk::Descend(int parent_fd, const std::string& name, const std::string& path, Entry& entry) {
+TreeWalk::Place TreeWalk::PlaceIn(const Level& level, const std::string& path) const {
+  return level.indexed ? Place::kIndexed : rules_.place_of(path);
+}
+
+bool TreeWalk::Descend(int parent_fd, const std::string& name, const std::string& path, bool indexed, Entry& entry) {
   auto level = std::make_unique<Level>();
   level->folder.Reset(openat(parent_fd, name.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
   struct stat status = {};
   int error = level->folder.Valid() && fstat(level->folder.Get(), &status) == 0 ? 0 : errno;
   if (error == 0) {
     level->device = status.st_dev;
+    level->indexed = indexed;
     level->prefix = path + "/";
     errno = 0;
     ReadNames(*level);
@@ -148,23 +157,26 @@ void TreeWalk::ReadNames(Level& level) {
 
 bool TreeWalk::Examine(Level& level, const Item& item, Entry& entry) {
   const std::string name = level.Name(item);
+  std::string path = level.prefix + name;
+  const Place place = PlaceIn(level, path);
+  if (place == Place::kOutside) return false;
   struct stat status = {};
   if (fstatat(level.folder.Get(), name.c_str(), &status, AT_SYMLINK_NOFOLLOW) != 0) {
     const int error = errno;
-    if (error != ENOENT) rules_.on_problem(level.prefix + name, error);
-    if (MeansNothingThere(error)) return false;
-    entry = {Entry::Kind::kUnknown, level.prefix + name, {}};
+    if (error != ENOENT) rules_.on_problem(path, error);
+    if (MeansNothingThere(error) || place == Place::kOnTheWay) return false;
+    entry = {Entry::Kind::kUnknown, std::move(path), {}};
     return true;
   }
   if (S_ISLNK(status.st_mode)) {
     ++links_skipped_;
     return false;
   }
-  std::string path = level.prefix + name;
   if (S_ISDIR(status.st_mode) && !rules_.may_enter(path, status, level.device)) {
     level.not_entered.insert(name);
     return false;
   }
+  if (place == Place::kOnTheWay) return false;
   entry = {Entry::Kind::kFound, std::move(path), status};
   return true;
 }

@@ -8,10 +8,17 @@
 #include <string>
 #include <vector>
 
+#include "services/fileindexd/share_folders.h"
+
 namespace ferrox::indexd {
 
 /// What a walk leaves out, and whom it tells.
 struct WalkRules {
+  /// What a path is for the walk: entries outside are left out, with what is below; a folder on the way is entered, but
+  /// not returned. Not asked below an indexed folder, where all is indexed.
+  std::function<ShareFolders::Place(const std::string& path)> place_of = [](const std::string&) {
+    return ShareFolders::Place::kIndexed;
+  };
   /// Whether a name is never indexed, nor anything below it.
   std::function<bool(const std::string& name)> skip_name = [](const std::string&) { return false; };
   /// Whether a folder found below one on the device `parent_device` may be entered; asked once per folder.
@@ -51,10 +58,12 @@ class TreeWalk {
   uint64_t LinksSkipped() const { return links_skipped_; }
 
  private:
+  using Place = ShareFolders::Place;
   struct Level;
   struct Item;
+  Place PlaceIn(const Level& level, const std::string& path) const;
   /// Opens and reads a folder, which is walked next. True when it could not be read and `entry` says so.
-  bool Descend(int parent_fd, const std::string& name, const std::string& path, Entry& entry);
+  bool Descend(int parent_fd, const std::string& name, const std::string& path, bool indexed, Entry& entry);
   void ReadNames(Level& level);
   /// True when `entry` is to be returned.
   bool Examine(Level& level, const Item& item, Entry& entry);

@@ -22,14 +22,18 @@ class FakeIndex : public indexd::ShareIndex {
  public:
   struct Document {
     std::string stamp;
+    bool with_content = false;
     std::string content;  ///< what was read when it was last upserted
   };
 
   bool Exists() override { return exists; }
-  void Create() override { exists = true; }
+  void Create() override {
+    exists = true;
+    ++creations;
+  }
 
   void Upsert(const std::string& path, bool need_meta) override {
-    const Document document = {StampOf(path), need_meta ? ContentOf(path) : ""};
+    const Document document = {StampOf(path), need_meta, need_meta ? ContentOf(path) : ""};
     const std::lock_guard lock(mutex);
     if (before_write) before_write(path);
     ++upserts[path];
@@ -75,7 +79,7 @@ class FakeIndex : public indexd::ShareIndex {
     std::vector<indexd::IndexedEntry> page;
     for (auto at = documents.upper_bound(after.empty() ? folder + "/" : after);
          at != documents.end() && StringStartWith(at->first, folder + "/") && page.size() < limit; ++at) {
-      page.push_back({at->first, at->second.stamp});
+      page.push_back({at->first, at->second.stamp, at->second.with_content});
     }
     return page;
   }
@@ -84,7 +88,7 @@ class FakeIndex : public indexd::ShareIndex {
     const std::lock_guard lock(mutex);
     const auto found = documents.find(path);
     if (found == documents.end()) return {};
-    return {{path, found->second.stamp}};
+    return {{path, found->second.stamp, found->second.with_content}};
   }
 
   Json::Value Figures() override { return Json::Value(); }
@@ -93,6 +97,7 @@ class FakeIndex : public indexd::ShareIndex {
   bool exists = true;
   std::map<std::string, Document> documents;
   std::map<std::string, int> upserts;
+  int creations = 0;
   int renames = 0;
   int lists = 0;
   int commits = 0;

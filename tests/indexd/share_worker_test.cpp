@@ -1,123 +1,29 @@
 #include "services/fileindexd/share_worker.h"
 
-#include <sys/stat.h>
+#include <functional>
 
-#include <filesystem>
-#include <random>
-#include <set>
-
-#include <gtest/gtest.h>
-
-#include "common/json_util.h"
-#include "platform/host/share_table.h"
-#include "sdk/share.h"
-#include "tests/indexd/fake_index.h"
-#include "tests/support/temp_dir.h"
+#include "tests/indexd/worker_test.h"
 
 namespace ferrox::indexd {
 namespace {
 
-namespace fs = std::filesystem;
-using test::FakeIndex;
-
-std::string Line(unsigned event, const std::string& path, const std::string& path_old = "", bool is_dir = false) {
-  Json::Value line;
-  line["event"] = event;
-  line["path"] = path;
-  line["path_old"] = path_old;
-  line["is_dir"] = is_dir;
-  return toString(line) + "\n";
-}
-
-constexpr unsigned kModify = 0x2, kAttr = 0x4, kCreate = 0x40, kDelete = 0x80, kRename = 0x100, kCrashed = 0x200,
-                   kReindex = 0x10000;
-
-/// A share in a fresh folder, its worker, and an index in memory.
-class ShareWorkerTest : public testing::Test {
- protected:
-  void SetUp() override {
-    share = "s" + std::to_string(++last_share);
-    root = fs::canonical(folder.Path()).string() + "/" + share;
-    fs::create_directory(root);
-    kova::host::ShareEntry entry;
-    entry.name = share;
-    entry.path = root;
-    kova::host::AddShare(entry);
-    queue_path = sdk::SDKShare(share).GetQueuePath();
-    worker = MakeWorker();
-  }
-
-  void TearDown() override {
-    worker.reset();
-    kova::host::RemoveShare(share);
-  }
-
-  std::unique_ptr<ShareWorker> MakeWorker() {
-    return std::make_unique<ShareWorker>(share, ShareWorker::Environment{pool, pause, [this](const std::string&) {
-                                                                           auto fake = std::make_unique<FakeIndex>();
-                                                                           fake->documents = kept;
-                                                                           index = fake.get();
-                                                                           return fake;
-                                                                         }});
-  }
-
-  /// Another process in the place of the first, which stopped where it was.
-  void Restart() {
-    kept = index->documents;
-    worker = MakeWorker();
-  }
-
-  void Queue(const std::string& lines) { test::WriteFile(queue_path, test::ReadFile(queue_path) + lines); }
-  void Process(const std::string& lines) {
-    Queue(lines);
-    worker->RunOnce();
-  }
-  std::string At(const std::string& name) const { return root + "/" + name; }
-
-  /// The indexed paths below the root, and the content of files: "a=text" or "folder".
-  std::set<std::string> Indexed() const {
-    std::set<std::string> found;
-    for (const auto& [path, document] : index->documents) {
-      const std::string name = path.substr(root.size() + 1);
-      found.insert(fs::is_regular_file(path) ? name + "=" + document.content : name);
-    }
-    return found;
-  }
-  std::set<std::string> OnDisk() const {
-    std::set<std::string> found;
-    for (const auto& entry : fs::recursive_directory_iterator(root)) {
-      const std::string name = entry.path().string().substr(root.size() + 1);
-      found.insert(entry.is_regular_file() ? name + "=" + test::ReadFile(entry.path()) : name);
-    }
-    return found;
-  }
-
-  static inline int last_share = 0;
-  const test::TempDir folder;
-  const InterruptibleClock clock;
-  TaskPool pool{2};
-  PauseState pause;
-  std::string share, root, queue_path;
-  std::map<std::string, FakeIndex::Document> kept;
-  FakeIndex* index = nullptr;
-  std::unique_ptr<ShareWorker> worker;
-};
+using ShareWorkerTest = WorkerTest;
 
 TEST_F(ShareWorkerTest, EachOperationGivesTheStateOfTheDisk) {
   test::WriteFile(At("old/deep/a"), "1");
   test::WriteFile(At("f"), "2");
   Process(Line(kReindex, root));
-  EXPECT_EQ(OnDisk(), Indexed());
+  EXPECT_EQ(Expected(), Indexed());
 
   test::WriteFile(At("f"), "changed");
   test::WriteFile(At("new"), "3");
   Process(Line(kModify, At("f")) + Line(kCreate, At("new")));
-  EXPECT_EQ(OnDisk(), Indexed());
+  EXPECT_EQ(Expected(), Indexed());
 
   fs::rename(At("old"), At("moved"));
   fs::remove(At("f"));
   Process(Line(kRename, At("moved"), At("old"), true) + Line(kDelete, At("f")));
-  EXPECT_EQ(OnDisk(), Indexed());
+  EXPECT_EQ(Expected(), Indexed());
   EXPECT_EQ(1, index->renames);
   EXPECT_EQ(1, index->upserts[At("old/deep/a")]);
   EXPECT_EQ(0, index->upserts[At("moved/deep/a")]) << "a rename moves documents without reading files";
@@ -125,12 +31,12 @@ TEST_F(ShareWorkerTest, EachOperationGivesTheStateOfTheDisk) {
   fs::remove(At("new"));
   test::WriteFile(At("new/inside"), "a folder in the place of a file");
   Process(Line(kDelete, At("new")) + Line(kCreate, At("new"), "", true));
-  EXPECT_EQ(OnDisk(), Indexed());
+  EXPECT_EQ(Expected(), Indexed());
 
   fs::remove_all(At("moved"));
   test::WriteFile(At("lost"), "the event of this was lost");
   Process(Line(kCrashed, root));
-  EXPECT_EQ(OnDisk(), Indexed());
+  EXPECT_EQ(Expected(), Indexed());
   EXPECT_FALSE(fs::exists(queue_path + ".tmp"));
 }
 
@@ -141,7 +47,7 @@ TEST_F(ShareWorkerTest, ReindexTouchesOnlyWhatDiffers) {
   test::WriteFile(At("d3/f3"), "changed");
   fs::remove(At("d4/f4"));
   Process(Line(kReindex, root));
-  EXPECT_EQ(OnDisk(), Indexed());
+  EXPECT_EQ(Expected(), Indexed());
   EXPECT_EQ((std::map<std::string, int>{{At("d3/f3"), 1}, {At("d4"), 1}}), index->upserts);
 }
 
@@ -153,7 +59,7 @@ TEST_F(ShareWorkerTest, CopiedTreeIsComparedOnce) {
     lines += Line(kCreate, At(name), "", true);
   }
   Process(lines);
-  EXPECT_EQ(OnDisk(), Indexed());
+  EXPECT_EQ(Expected(), Indexed());
   EXPECT_LE(index->lists, 2);
 }
 
@@ -186,7 +92,7 @@ TEST_F(ShareWorkerTest, VanishedFilesAndForeignPathsStopNothing) {
   test::WriteFile(At("there"), "1");
   Process(Line(kCreate, At("gone")) + Line(kModify, "/etc/passwd") + Line(kAttr, At("gone2")) +
           Line(kRename, At("gone4"), At("gone3")) + "not json\n" + Line(kCreate, At("there")));
-  EXPECT_EQ(OnDisk(), Indexed());
+  EXPECT_EQ(Expected(), Indexed());
 }
 
 /// The engine stops after each number of writes in turn; the next process must come to the same end, whatever had been
@@ -213,7 +119,7 @@ TEST_F(ShareWorkerTest, StoppedAnywhereAndTakenUpAgainEndsTheSame) {
     }
     Restart();
     worker->RunOnce();
-    EXPECT_EQ(OnDisk(), Indexed());
+    EXPECT_EQ(Expected(), Indexed());
   }
 }
 
@@ -231,15 +137,25 @@ TEST_F(ShareWorkerTest, PauseStopsInTheMiddleAndKeepsTheQueue) {
   pause.Set(-1);
   Restart();
   worker->RunOnce();
-  EXPECT_EQ(OnDisk(), Indexed());
+  EXPECT_EQ(Expected(), Indexed());
 }
 
-TEST_F(ShareWorkerTest, MissingIndexIsMadeAndFilled) {
+TEST_F(ShareWorkerTest, MissingIndexIsMadeAfterAWhileAndFilled) {
+  patience = std::chrono::hours(1);
+  worker = MakeWorker();
   test::WriteFile(At("a"), "1");
   index->exists = false;
+  EXPECT_THROW(worker->RunOnce(), Error) << "it may be about to get this name";
+  patience = std::chrono::milliseconds(0);
+  worker = MakeWorker();
+  index->exists = false;
+  SetFolders({});
+  EXPECT_THROW(worker->RunOnce(), Error) << "its last folder is gone";
+  EXPECT_EQ(0, index->creations);
+  SetFolders({{"", "davp"}});
   worker->RunOnce();
-  EXPECT_TRUE(index->exists);
-  EXPECT_EQ(OnDisk(), Indexed());
+  EXPECT_EQ(1, index->creations);
+  EXPECT_EQ(Expected(), Indexed());
 }
 
 TEST_F(ShareWorkerTest, MissingFolderIsNoDeletion) {

@@ -1,0 +1,186 @@
+#include <functional>
+
+#include "fileindex/status_mgr.h"
+#include "tests/indexd/worker_test.h"
+
+namespace ferrox::indexd {
+namespace {
+
+/// Configurations of the tree below, from nothing over nested ones to the whole share.
+const Folders kConfigurations[] = {
+    {},
+    {{"", "davp"}},
+    {{"", "p"}},
+    {{"", "dav"}, {"/d", "p"}},
+    {{"/d", "davp"}},
+    {{"/d/deep", "d"}},
+    {{"/d", ""}, {"/d/deep", "davp"}, {"/d/deep/e", "a"}},
+    {{"/d-x", "davp"}, {"/missing/far", "d"}, {"/f.txt", "d"}},
+    {{"/d/deep/e", "v"}, {"/d-x", "d"}},
+};
+
+class FoldersTest : public WorkerTest {
+ protected:
+  void MakeTree() {
+    for (const std::string place : {"", "d/", "d/deep/", "d/deep/e/", "d-x/", "d0/"}) {
+      for (const char* name : {"f.txt", "f.mp3", "f.mkv", "f.jpg", "f.other", "f"}) {
+        test::WriteFile(At(place + name), place + name);
+      }
+    }
+  }
+
+  /// The documents that have to be written when the index is `before` and must be `after`.
+  static size_t ToWrite(const std::set<std::string>& before, const std::set<std::string>& after) {
+    size_t count = 0;
+    for (const std::string& document : after) count += before.count(document) == 0 ? 1 : 0;
+    return count;
+  }
+  size_t Written() const {
+    size_t count = 0;
+    for (const auto& [path, times] : index->upserts) count += static_cast<size_t>(times);
+    return count;
+  }
+  void StartWith(const Folders& folders) {
+    SetFolders(folders);
+    kept.clear();
+    worker = MakeWorker();
+    Process(Line(kReindex, root));
+    ASSERT_EQ(Expected(), Indexed());
+    index->upserts.clear();
+  }
+};
+
+TEST_F(FoldersTest, EachChangeOfFoldersTouchesExactlyWhatDiffers) {
+  MakeTree();
+  for (const Folders& before : kConfigurations) {
+    for (const Folders& after : kConfigurations) {
+      SCOPED_TRACE(testing::PrintToString(before) + " -> " + testing::PrintToString(after));
+      StartWith(before);
+      const std::set<std::string> indexed_before = Indexed();
+      SetFolders(after);
+      std::string lines;
+      for (const Folders* folders : {&before, &after}) {
+        for (const auto& [path, kinds] : *folders) lines += Line(kUpdateCfg, root + path);
+      }
+      Process(lines);
+      EXPECT_EQ(Expected(), Indexed());
+      EXPECT_EQ(ToWrite(indexed_before, Expected()), Written());
+    }
+  }
+}
+
+TEST_F(FoldersTest, SwitchedKindWritesOnlyItsFiles) {
+  for (int i = 0; i < 2000; ++i)
+    test::WriteFile(At("d" + std::to_string(i % 9) + "/" + std::to_string(i) + ".txt"), "x");
+  for (int i = 0; i < 10; ++i) test::WriteFile(At("d1/" + std::to_string(i) + ".jpg"), "x");
+  StartWith({{"", "davp"}});
+  SetFolders({{"", "dav"}});
+  Process(Line(kUpdateCfg, root));
+  EXPECT_EQ(10U, Written());
+  EXPECT_EQ(Expected(), Indexed());
+}
+
+TEST_F(FoldersTest, RenameAcrossAnyBorder) {
+  struct Row {
+    const char* from;
+    const char* to;
+  };
+  const Row rows[] = {{"d", "moved"},         {"d-x", "d/x"},         {"d/deep", "up"},         {"d/deep/e", "d-x/e"},
+                      {"d0", "missing"},      {"d/f.txt", "d/f.jpg"}, {"f.mp3", "d/g.mp3"},     {"d-x/f", "here"},
+                      {"d/deep", "d-x/deep"}, {"d0/f.txt", "d0.txt"}, {"d/deep/f.jpg", "p.jpg"}};
+  for (const Folders& folders : kConfigurations) {
+    for (const Row& row : rows) {
+      SCOPED_TRACE(testing::PrintToString(folders) + ": " + row.from + " -> " + row.to);
+      fs::remove_all(root);
+      MakeTree();
+      StartWith(folders);
+      fs::rename(At(row.from), At(row.to));
+      Process(Line(kRename, At(row.to), At(row.from), fs::is_directory(At(row.to))));
+      EXPECT_EQ(Expected(), Indexed());
+    }
+  }
+}
+
+TEST_F(FoldersTest, SingleEventsKeepToTheFolders) {
+  MakeTree();
+  for (const Folders& folders : kConfigurations) {
+    SCOPED_TRACE(testing::PrintToString(folders));
+    StartWith(folders);
+    std::string lines;
+    for (const char* name : {"f.txt", "d/f.jpg", "d/deep/f.mp3", "d/deep/e/f.mkv", "d-x/f.other", "d0/f"}) {
+      test::WriteFile(At(name), std::string("changed ") + name);
+      lines += Line(kModify, At(name)) + Line(kAttr, At("d/deep"));
+    }
+    fs::remove(At("d/deep/f.txt"));
+    Process(lines + Line(kDelete, At("d/deep/f.txt")));
+    EXPECT_EQ(Expected(), Indexed());
+    MakeTree();
+  }
+}
+
+/// The library takes a reindex that is being carried out for one that covers the new configuration.
+TEST_F(FoldersTest, ChangeInTheMiddleOfAReindexIsNotLost) {
+  MakeTree();
+  for (const unsigned event : {kReindex, kCrashed}) {
+    for (const Folders& after : kConfigurations) {
+      SCOPED_TRACE(testing::PrintToString(after));
+      SetFolders({{"/d", "davp"}});
+      kept.clear();
+      worker = MakeWorker();
+      int writes = 0;
+      index->before_write = [this, &writes, &after](const std::string&) {
+        if (++writes == 5) SetFolders(after);
+      };
+      Process(Line(event, root));
+      EXPECT_EQ(Expected(), Indexed());
+      EXPECT_EQ(0, fileindex::StatusMgr().GetShareStatus(share));
+    }
+  }
+}
+
+TEST_F(FoldersTest, ChangeSwallowedByAReindexElsewhereIsMadeUpFor) {
+  MakeTree();
+  StartWith({{"/d", "davp"}});
+  fs::rename(At("d"), At("new"));
+  SetFolders({{"/new", "davp"}});
+  Process(Line(kReindex, At("new")));
+  EXPECT_EQ(Expected(), Indexed());
+}
+
+/// The index has been given the share's new name; its documents still have the paths of before.
+TEST_F(FoldersTest, RenamedShareTakesItsDocumentsAlong) {
+  const std::string old_root = root;
+  const std::string old_share = share;
+  for (const bool told : {true, false}) {
+    for (const Folders& folders : kConfigurations) {
+      SCOPED_TRACE(testing::PrintToString(folders) + (told ? " told" : " not told"));
+      MakeTree();
+      StartWith(folders);
+      kept = index->documents;
+      kept["/elsewhere/stray"] = {};
+      kept[root + "0"] = {};
+      Configure(share, {});
+      fs::rename(old_root, old_root + "new");
+      share += "new";
+      root += "new";
+      kova::host::RenameShare(old_share, share, root);
+      queue_path = sdk::SDKShare(share).GetQueuePath();
+      SetFolders(folders);
+      worker = MakeWorker();
+      Process(told ? Line(kRename, root, old_root) : Line(kReindex, root));
+      EXPECT_EQ(Expected(), Indexed());
+      size_t files = 0;
+      for (const auto& [path, times] : index->upserts) files += fs::is_directory(path) ? 0 : 1;
+      EXPECT_TRUE(!told || files == 0) << "files are not read again";
+      Configure(share, {});
+      fs::rename(root, old_root);
+      kova::host::RenameShare(share, old_share, old_root);
+      share = old_share;
+      root = old_root;
+      queue_path = sdk::SDKShare(share).GetQueuePath();
+    }
+  }
+}
+
+}  // namespace
+}  // namespace ferrox::indexd
