@@ -5,17 +5,29 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <chrono>
+#include <memory>
 #include <thread>
 
 #include "common/error.h"
 #include "common/json_util.h"
 #include "common/log.h"
+#include "common/paths.h"
 #include "fileindex/status_mgr.h"
-#include "sdk/share.h"
 
 namespace ferrox::indexd {
 
 namespace {
+
+/// The configuration is looked at again after so long, whether or not it was seen to change.
+constexpr std::chrono::seconds kSlowTimer(30);
+constexpr std::chrono::seconds kSlowTimerWithoutWatch(2);
+
+std::vector<std::string> FilesOf(const IndexDaemon::Options& options) {
+  std::vector<std::string> files = options.share_files;
+  files.push_back(InstancePath(kFileIndexFoldersCfgPath));
+  return files;
+}
 
 /// A walk holds one open folder a level.
 void AllowManyOpenFiles() {
@@ -26,6 +38,12 @@ void AllowManyOpenFiles() {
 }
 
 unsigned ThreadsFor(unsigned wanted) { return wanted != 0 ? wanted : std::thread::hardware_concurrency(); }
+
+std::string ShareName(const Json::Value& data) {
+  std::string share;
+  GetJsonValue(share, data, "share_name", true);
+  return share;
+}
 
 Json::Value ErrorReply(int code, const std::string& message) {
   Json::Value reply;
@@ -51,9 +69,20 @@ constexpr IndexDaemon::Command IndexDaemon::kCommands[] = {
     {"status", &IndexDaemon::OnStatus},
 };
 
-IndexDaemon::IndexDaemon(const Options& options) : pool_(ThreadsFor(options.workers)) { AllowManyOpenFiles(); }
+IndexDaemon::IndexDaemon(const Options& options)
+    : pool_(ThreadsFor(options.workers)),
+      workers_([this](const std::string& share) {
+        return std::make_unique<ShareWorker>(share, ShareWorker::Environment{pool_, pause_});
+      }),
+      configuration_(FilesOf(options)) {
+  AllowManyOpenFiles();
+}
 
-IndexDaemon::~IndexDaemon() = default;
+IndexDaemon::~IndexDaemon() {
+  stopping_ = true;
+  configuration_.Wake();
+  if (follower_.joinable()) follower_.join();
+}
 
 void IndexDaemon::Start() {
   try {
@@ -62,8 +91,24 @@ void IndexDaemon::Start() {
     // Every worker meets the same unreadable file and says so in its status.
     Log(LOG_ERR, "the pause is unknown: %s", error.what());
   }
-  const std::lock_guard lock(mutex_);
-  for (const std::string& share : sdk::SDKShare::Enum()) CreateWorker(share);
+  Reconcile();
+  follower_ = std::thread([this] { Follow(); });
+}
+
+/// Not every operation that changes shares or folders tells the daemon.
+void IndexDaemon::Follow() {
+  while (!stopping_) {
+    configuration_.Wait(configuration_.SeesChanges() ? kSlowTimer : kSlowTimerWithoutWatch);
+    if (!stopping_) Reconcile();
+  }
+}
+
+void IndexDaemon::Reconcile() {
+  try {
+    workers_.Reconcile();
+  } catch (const Error& error) {
+    Log(LOG_ERR, "the workers stay as they are: %s (%d)", error.what(), error.Code());
+  }
 }
 
 std::string IndexDaemon::Handle(const std::string& request, const services::Peer& peer) {
@@ -109,42 +154,21 @@ Json::Value IndexDaemon::OnResume(const Json::Value&) {
 
 void IndexDaemon::SetPause(int64_t resume_time) {
   pause_.Set(resume_time);
-  const std::lock_guard lock(mutex_);
-  for (const auto& [share, worker] : workers_) worker->Wake();
+  workers_.WakeAll();
 }
 
-/// A worker that exists is made anew, since the share may have moved.
 Json::Value IndexDaemon::OnWorkerCreate(const Json::Value& data) {
-  std::string share;
-  GetJsonValue(share, data, "share_name", true);
-  const std::lock_guard lock(mutex_);
-  CreateWorker(share);
+  workers_.Create(ShareName(data));
   return Json::Value();
 }
 
 Json::Value IndexDaemon::OnWorkerDelete(const Json::Value& data) {
-  std::string share;
-  GetJsonValue(share, data, "share_name", true);
-  const std::lock_guard lock(mutex_);
-  workers_.erase(share);
+  workers_.Delete(ShareName(data));
   return Json::Value();
 }
 
-/// The share's worker looks at its share again; one that is missing or no longer has a share is made or removed.
 Json::Value IndexDaemon::OnSettingChanged(const Json::Value& data) {
-  std::string share;
-  GetJsonValue(share, data, "share_name", true);
-  const std::vector<std::string> shares = sdk::SDKShare::Enum();
-  const bool exists = std::find(shares.begin(), shares.end(), share) != shares.end();
-  const std::lock_guard lock(mutex_);
-  const auto known = workers_.find(share);
-  if (!exists) {
-    workers_.erase(share);
-  } else if (known != workers_.end()) {
-    known->second->Wake();
-  } else {
-    CreateWorker(share);
-  }
+  workers_.SettingChanged(ShareName(data));
   return Json::Value();
 }
 
@@ -154,17 +178,8 @@ Json::Value IndexDaemon::OnStatus(const Json::Value&) {
   status["resume_time"] = Json::Int64(pause_.ResumeTime());
   status["paused"] = pause_.Paused();
   status["workers"] = pool_.Threads();
-  status["shares"] = Json::Value(Json::arrayValue);
-  const std::lock_guard lock(mutex_);
-  for (const auto& [share, worker] : workers_) status["shares"].append(worker->Status());
+  status["shares"] = workers_.Status();
   return status;
-}
-
-void IndexDaemon::CreateWorker(const std::string& share) {
-  workers_.erase(share);
-  auto worker = std::make_unique<ShareWorker>(share, ShareWorker::Environment{pool_, pause_});
-  worker->Start();
-  workers_[share] = std::move(worker);
 }
 
 }  // namespace ferrox::indexd

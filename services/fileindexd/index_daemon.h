@@ -1,23 +1,30 @@
 #pragma once
 
-#include <map>
-#include <memory>
-#include <mutex>
+#include <atomic>
 #include <string>
+#include <thread>
+#include <vector>
 
 #include <json/value.h>
 
+#include "services/fileindexd/file_watch.h"
+#include "services/fileindexd/interruption.h"
 #include "services/fileindexd/share_worker.h"
+#include "services/fileindexd/task_pool.h"
+#include "services/fileindexd/worker_set.h"
 #include "services/support/frame_server.h"
 
 namespace ferrox::indexd {
 
-/// The workers of all shares and the commands that steer them (docs/formats/daemon.md).
+/// Keeps the workers of the shares in step with the folders and shares, and answers the commands that steer them
+/// (docs/formats/daemon.md).
 class IndexDaemon {
  public:
   struct Options {
     /// Threads that read files, for all shares together; 0: one a processor.
     unsigned workers = 0;
+    /// Files that change when shares do; without them that is noticed at intervals.
+    std::vector<std::string> share_files = {};
   };
 
   explicit IndexDaemon(const Options& options);
@@ -26,7 +33,7 @@ class IndexDaemon {
   /// Stops all work where it is.
   ~IndexDaemon();
 
-  /// Takes the pause from the status file and makes a worker for each share.
+  /// Takes the pause from the status file and makes the workers.
   void Start();
 
   /// Answers one request; never throws. Safe from several threads.
@@ -45,13 +52,16 @@ class IndexDaemon {
 
   Json::Value Dispatch(const std::string& request, const services::Peer& peer);
   void SetPause(int64_t resume_time);
-  void CreateWorker(const std::string& share);
+  void Follow();
+  void Reconcile();
 
   InterruptibleClock clock_;
   TaskPool pool_;
   PauseState pause_;
-  std::mutex mutex_;  ///< guards the map; held while workers are made and stopped, so that commands keep their order
-  std::map<std::string, std::unique_ptr<ShareWorker>> workers_;
+  WorkerSet workers_;
+  FileWatch configuration_;
+  std::atomic<bool> stopping_{false};
+  std::thread follower_;
 };
 
 }  // namespace ferrox::indexd

@@ -5,6 +5,7 @@
 #include <exception>
 
 #include "common/paths.h"
+#include "platform/host/share_table.h"
 #include "services/fileindexd/index_daemon.h"
 #include "services/support/daemon.h"
 
@@ -45,6 +46,7 @@ int main(int argc, char** argv) try {
     return understood ? 0 : 2;
   }
   ferrox::services::Daemon daemon("fileindexd");
+  options.share_files = {kova::host::ShareTablePath()};
   ferrox::indexd::IndexDaemon index_daemon(options);
   ferrox::services::FrameServerOptions server_options;
   server_options.socket_path = ferrox::InstancePath(ferrox::kFileIndexdSocket);

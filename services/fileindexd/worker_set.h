@@ -1,0 +1,59 @@
+#pragma once
+
+#include <functional>
+#include <map>
+#include <memory>
+#include <mutex>
+#include <string>
+
+#include <json/value.h>
+
+#include "services/fileindexd/share_worker.h"
+
+namespace ferrox::indexd {
+
+/// The workers of all shares. A share has one when a folder names it, it exists, and not all of its folders are paused,
+/// or as the last command for it says while the folders file does not say so yet (docs/formats/daemon.md has the orders
+/// in which the management operations do things). Every call is safe from any thread; calls are carried out one after
+/// the other.
+class WorkerSet {
+ public:
+  using MakeWorker = std::function<std::unique_ptr<ShareWorker>(const std::string& share)>;
+
+  /// `make` is called with the name of a share that exists; the set starts what it returns.
+  explicit WorkerSet(MakeWorker make) : make_(std::move(make)) {}
+
+  /// Makes and ends workers so that they are those of the present folders and shares. One whose share lies elsewhere
+  /// now is made anew. @throws Error when the folders or shares cannot be told; nothing is changed then.
+  void Reconcile();
+
+  /// The share gets a worker, a new one in place of one it has, whatever its folders' pause says. Nothing happens for a
+  /// share that no folder names. @throws as Reconcile.
+  void Create(const std::string& share);
+  /// Ends the share's worker; it stays away until Create, SettingChanged, or until its folders were paused and resumed.
+  void Delete(const std::string& share);
+  /// Forgets what was commanded for the share, and has its worker look at the folders again. @throws as Reconcile.
+  void SettingChanged(const std::string& share);
+
+  void WakeAll();
+  /// One object a worker, in the order of the shares' names.
+  Json::Value Status() const;
+
+ private:
+  enum class Command { kCreate, kDelete };
+  struct IndexedShare {
+    std::string root;
+    bool all_paused = true;
+  };
+  static std::map<std::string, IndexedShare> IndexedShares();
+
+  void ReconcileLocked();
+  bool Wants(const std::string& share, const IndexedShare& indexed);
+
+  MakeWorker make_;
+  mutable std::mutex mutex_;  ///< held while workers are made and stopped, so that commands keep their order
+  std::map<std::string, Command> commanded_;
+  std::map<std::string, std::unique_ptr<ShareWorker>> workers_;
+};
+
+}  // namespace ferrox::indexd
