@@ -11,8 +11,9 @@
 
 /// The management operations: what is indexed, and how the index follows shares, volumes and users. Each loads the
 /// configuration, changes it, has the engine and the daemons follow, and queues events; none indexes a file itself.
-/// A failure of a step is thrown as it comes and leaves what was done before it. Besides the codes named, each may
-/// throw kLoadFailed, kSaveFailed, kInternal, kEngineUnreachable and the engine's own codes.
+/// A failure of a step is thrown as it comes and leaves what was done before it; the log then names what was not done.
+/// Unless they say that they throw nothing, each may throw besides the codes named kLoadFailed, kSaveFailed, kInternal,
+/// kEngineUnreachable and the engine's own codes.
 namespace ferrox::fileindex {
 
 /// Add folders (an array in the stored form, docs/formats/folders.md), or change those that exist and add the others.
@@ -29,7 +30,8 @@ FERROX_EXPORT void FolderSet(const Json::Value& folder_list, bool updater_mode);
 FERROX_EXPORT void FolderReindex(const Json::Value& path_list);
 
 /// Removes folders (an array of share paths), all or none. A share whose last folder goes loses its index, its queue
-/// and its watches; with the last folder of all the services stop. Holds the folder lock.
+/// and its watches; with the last folder of all the services stop. Of a share that is gone only the index and the
+/// status bits can be removed. Holds the folder lock.
 /// @throws Error kBadArgument; kNoSuchFolder; kLockFailed.
 FERROX_EXPORT void FolderDelete(const Json::Value& path_list);
 
@@ -43,7 +45,7 @@ FERROX_EXPORT void FolderList(Json::Value& out, unsigned int offset, unsigned in
 /// The following throw kBadArgument "Missing ..." for an empty argument, before anything is changed.
 
 /// The platform has renamed a share: its folders, its index and its documents follow. @throws Error kNoSuchShare when
-/// there is no share `share_to`.
+/// there is no share `share_to`; the folders have been renamed then.
 FERROX_EXPORT void ShareRename(const std::string& share_from, const std::string& share_to);
 /// The platform has moved a share's folder from `path_from` to `path_to`, both absolute; its index follows.
 FERROX_EXPORT void ShareMigrate(const std::string& share_name, const std::string& path_from,
@@ -54,7 +56,8 @@ FERROX_EXPORT void SharePause(const std::string& share_name);
 FERROX_EXPORT void ShareResume(const std::string& share_name);
 /// A paused share will not come back: its folders, its queue and its index are removed.
 FERROX_EXPORT void ShareClearPaused(const std::string& share_name, const std::string& share_path);
-/// Queues a comparison of the share's recycle bin, after it was switched on or off. May be called with any share.
+/// Queues a comparison of the share's recycle bin, after it was switched on or off. May be called with any share, and
+/// does nothing when the share's folder is missing or a link. @throws Error kNoSuchShare; as AddCustomEvent does.
 FERROX_EXPORT void ShareCheckRecycle(const std::string& share_name);
 
 /// The volume mounted at `mount_point` goes away, comes back, or will not come back.
@@ -62,17 +65,19 @@ FERROX_EXPORT void VolumePause(const std::string& mount_point);
 FERROX_EXPORT void VolumeResume(const std::string& mount_point);
 FERROX_EXPORT void VolumeClearPaused(const std::string& mount_point);
 
-/// The home service was switched on for one kind of accounts, or off: the homes' recycle bins are compared again.
-/// Failures to enumerate them are logged only. @throws Error as AddCustomEvent does.
+/// The home service was switched on for one kind of accounts, or off: the recycle bins of the homes, of that kind or of
+/// all, are compared again. Throws no Error: the first failure is logged and ends it.
 FERROX_EXPORT void HomeEnable(AUTH_TYPE auth);
 FERROX_EXPORT void HomeDisable(AUTH_TYPE auth);
-/// The platform has renamed a user, and with it the folder in the share "homes".
+/// The platform has renamed a user, and with it the folder in the share "homes": the folders there and the documents
+/// follow. @throws Error kNoSuchShare when there is no share "homes"; the folders have been renamed then.
 FERROX_EXPORT void UserRename(const std::string& user_from, const std::string& user_to);
 
 /// Starts the services that indexing needs when a folder is configured, else stops them. Failures are logged only.
 /// @throws Error kLoadFailed; kBadArgument.
 FERROX_EXPORT void PrepareServices();
-/// Rebuilds the term suggestions of those index databases that belong to shares with folders.
+/// Rebuilds the term suggestions of those of the index databases that belong to shares with folders, in the order of
+/// the shares. @throws Error kNoSuchShare when such a share is gone; kSpaceNotEnough.
 FERROX_EXPORT void UpdateTermSuggestion(const std::vector<std::string>& db_names);
 
 }  // namespace ferrox::fileindex

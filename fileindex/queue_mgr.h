@@ -48,6 +48,7 @@ class FERROX_EXPORT QueueMgr {
   bool IsFullPathHasReindex(const std::string& full_path);
 
  private:
+  friend class QueuedReindexes;
   friend class QueueScan;
 
   static bool FindQueue(const std::function<bool(std::shared_ptr<Event>)>& pred, const std::string& path);

@@ -14,8 +14,13 @@ EXPECTED = ["ferrox::Error::what() const", "ferrox::LockFile::~LockFile()", "fer
             "ferrox::fileindex::StatusMgr::Pause(int)", "ferrox::fileindex::elastic::SendRequestImpl(",
             "ferrox::fileindex::OPTree::ProcessOP(", "ferrox::fileindex::QueueMgr::PrepareTmpQueue()",
             "ferrox::fileindex::log_level"]
+EXPECTED += ["ferrox::fileindex::" + entry_point + "(" for entry_point in
+             ("FolderAdd", "FolderSet", "FolderReindex", "FolderDelete", "FolderGet", "FolderList", "ShareRename",
+              "ShareMigrate", "SharePause", "ShareResume", "ShareClearPaused", "ShareCheckRecycle", "VolumePause",
+              "VolumeResume", "VolumeClearPaused", "HomeEnable", "HomeDisable", "UserRename", "PrepareServices",
+              "UpdateTermSuggestion")]
 STANDARD = re.compile(r"^(\S+ )*?(typeinfo (name )?for |vtable for |guard variable for )?(std::|__gnu_cxx::|operator)")
-INTERNAL_HEADERS = {"file_types.h", "requests.h"}
+INTERNAL_HEADERS = {"custom_event.h", "file_types.h", "operation_steps.h", "related_services.h", "requests.h"}
 
 
 def main(library, header_folder):

@@ -51,8 +51,10 @@ int FakePlatform::CallCount(const std::string& function) const {
 
 bool FakeCallFails(const char* function, const std::string& arguments) {
   FakePlatform& platform = FakePlatform::Get();
+  const std::string call = std::string(function) + "(" + arguments + ")";
+  if (platform.on_call) platform.on_call(call);
   const std::lock_guard<std::mutex> guard(g_calls_mutex);
-  platform.calls.push_back(std::string(function) + "(" + arguments + ")");
+  platform.calls.push_back(call);
   const auto found = platform.failing.find(function);
   if (found == platform.failing.end()) return false;
   FakeFailure& failure = found->second;

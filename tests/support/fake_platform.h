@@ -116,6 +116,8 @@ struct FakePlatform {
 
   /// Every platform call in order: "KOVAShareGet(photo)", failing ones too.
   std::vector<std::string> calls;
+  /// Told of each call before it is carried out, when set.
+  std::function<void(const std::string& call)> on_call;
   bool Called(const std::string& call) const;
   /// How many calls there were of the named function.
   int CallCount(const std::string& function) const;

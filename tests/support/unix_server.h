@@ -6,13 +6,14 @@
 
 namespace ferrox::test {
 
-/// A Unix socket at `path` that takes one connection, hands it to `serve` on a thread of its own, and closes it.
+/// A Unix socket at `path` that takes so many connections, one after the other, hands each to `serve` on a thread of
+/// its own, and closes it.
 class UnixServer {
  public:
-  UnixServer(const std::string& path, std::function<void(int fd)> serve);
+  UnixServer(const std::string& path, std::function<void(int fd)> serve, int connections = 1);
   UnixServer(const UnixServer&) = delete;
   UnixServer& operator=(const UnixServer&) = delete;
-  /// Waits for `serve` to return; gives up a connection that nobody made.
+  /// Waits for `serve` to return; gives up connections that nobody made.
   ~UnixServer();
 
  private:
