@@ -5,6 +5,7 @@
 #include <signal.h>
 #include <sys/file.h>
 #include <sys/stat.h>
+#include <syslog.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -20,6 +21,7 @@
 #include "platform/base/frames.h"
 #include "platform/host/detached_process.h"
 #include "platform/host/files.h"
+#include "platform/host/log.h"
 
 namespace kova::host {
 
@@ -161,6 +163,11 @@ std::string LastServiceProblem() { return t_problem; }
 
 int ServiceFailure(int code, const std::string& problem) {
   t_problem = problem;
+  if (code == KOVA_ERR_NOT_SUPPORTED) {
+    LogChange(LOG_INFO, "services " + problem, problem);
+  } else {
+    LogLine(LOG_ERR, problem);
+  }
   return KOVA_FAIL(code);
 }
 

@@ -28,7 +28,7 @@ std::string LastServiceProblem();
 /// Where the named program's output goes in this instance.
 std::string ServiceLogPath(const std::string& program);
 
-/// Records a sentence for LastServiceProblem. @return -1
+/// Records a sentence for LastServiceProblem and logs it; what this host does not have is said once. @return -1
 int ServiceFailure(int code, const std::string& problem);
 
 }  // namespace kova::host

@@ -10,6 +10,7 @@
 #include <cstdlib>
 #include <cstring>
 #include <memory>
+#include <sstream>
 #include <utility>
 
 #include <json/reader.h>
@@ -29,6 +30,14 @@ bool ReadAll(int fd, std::string& text) {
   }
 }
 
+/// The parser's messages stand in several lines; a sentence for the log has one.
+std::string OneLine(const std::string& text) {
+  std::istringstream words(text);
+  std::string line;
+  for (std::string word; words >> word;) line += (line.empty() ? "" : " ") + word;
+  return line;
+}
+
 std::string Parse(const std::string& text, Json::Value& value) {
   Json::CharReaderBuilder builder;
   Json::CharReaderBuilder::strictMode(&builder.settings_);
@@ -41,7 +50,7 @@ std::string Parse(const std::string& text, Json::Value& value) {
     errors = error.what();
   }
   value = Json::Value();
-  return "is not JSON: " + errors;
+  return "is not JSON: " + OneLine(errors);
 }
 
 /// O_NONBLOCK: a FIFO at the path must not hold the opener.

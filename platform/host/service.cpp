@@ -1,6 +1,5 @@
 #include <unistd.h>
 
-#include <cstring>
 #include <string>
 
 #include <kova/instance.h>
@@ -25,13 +24,31 @@ constexpr ServiceRow kFileSharing = {"samba", nullptr, nullptr, "smbd.service"};
 
 bool HasServiceManager() { return kova::InstanceRoot().empty() && access("/run/systemd/system", F_OK) == 0; }
 
-const ServiceRow* Find(const char* name) {
-  for (const ServiceRow& row : kServices) {
-    if (name != nullptr && strcmp(row.name, name) == 0) return &row;
+bool IsInstalled(const ServiceRow& service) {
+  for (const char* folder :
+       {"/etc/systemd/system/", "/run/systemd/system/", "/usr/lib/systemd/system/", "/lib/systemd/system/"}) {
+    if (access((folder + std::string(service.unit)).c_str(), F_OK) == 0) return true;
   }
-  if (name != nullptr && strcmp(kFileSharing.name, name) == 0 && HasServiceManager()) return &kFileSharing;
-  (void)kova::host::ServiceFailure(KOVA_ERR_NOT_SUPPORTED,
-                                   std::string("there is no service \"") + (name != nullptr ? name : "") + "\" here");
+  return false;
+}
+
+/// The service of that name; null, with the failure recorded, when this host does not have it.
+const ServiceRow* Find(const char* name) {
+  const std::string wanted = name != nullptr ? name : "";
+  const ServiceRow* found = wanted == kFileSharing.name ? &kFileSharing : nullptr;
+  for (const ServiceRow& row : kServices) {
+    if (wanted == row.name) found = &row;
+  }
+  std::string problem;
+  if (found == nullptr) {
+    problem = "there is no service \"" + wanted + "\" here";
+  } else if (HasServiceManager()) {
+    if (!IsInstalled(*found)) problem = std::string("the service ") + found->unit + " is not installed";
+  } else if (found == &kFileSharing) {
+    problem = "the file-sharing service is the host's own and is not switched from here";
+  }
+  if (problem.empty()) return found;
+  (void)kova::host::ServiceFailure(KOVA_ERR_NOT_SUPPORTED, problem);
   return nullptr;
 }
 

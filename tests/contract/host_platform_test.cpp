@@ -1,13 +1,10 @@
 // What only the Linux host promises: the share table, identities, and what the kernel tells of file systems.
 
-#include <sched.h>
 #include <sys/mount.h>
 #include <sys/stat.h>
-#include <sys/wait.h>
 #include <unistd.h>
 
 #include <filesystem>
-#include <functional>
 #include <string>
 #include <thread>
 #include <vector>
@@ -22,6 +19,7 @@
 #include <kova/user.h>
 
 #include "platform/host/share_table.h"
+#include "tests/contract/in_child.h"
 #include "tests/support/temp_dir.h"
 
 namespace ferrox::test {
@@ -189,30 +187,6 @@ TEST_F(HostPlatformTest, PrivilegesFollowModeBits) {
   EXPECT_EQ(KOVA_PRIV_READ_WRITE, KOVAShareUserPrivGet("root", share));
   EXPECT_LT(KOVAShareUserPrivGet("no-such-user-here", share), 0);
   KOVAShareFree(share);
-}
-
-/// Runs `body` in a process of its own and expects it to have no failures. With `privately`, in namespaces of its own,
-/// as root there, so that it may mount. False when this system does not let it.
-bool InChild(bool privately, const std::function<void()>& body) {
-  const uid_t uid = geteuid();
-  const gid_t gid = getegid();
-  const pid_t child = fork();
-  if (child == 0) {
-    if (privately && unshare(CLONE_NEWNS | (uid != 0 ? CLONE_NEWUSER : 0)) != 0) _exit(77);
-    if (privately && uid != 0) {
-      WriteFile("/proc/self/setgroups", "deny");
-      WriteFile("/proc/self/uid_map", "0 " + std::to_string(uid) + " 1");
-      WriteFile("/proc/self/gid_map", "0 " + std::to_string(gid) + " 1");
-    }
-    if (privately && mount(nullptr, "/", nullptr, MS_REC | MS_PRIVATE, nullptr) != 0) _exit(77);
-    body();
-    _exit(testing::Test::HasFailure() ? 1 : 0);
-  }
-  int status = 0;
-  (void)waitpid(child, &status, 0);
-  if (WIFEXITED(status) && WEXITSTATUS(status) == 77) return false;
-  EXPECT_EQ(0, status) << "see the failures above";
-  return true;
 }
 
 TEST_F(HostPlatformTest, RootBecomesAnybodyAndComesBack) {

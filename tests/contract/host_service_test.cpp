@@ -107,6 +107,8 @@ TEST_F(HostServiceTest, WhatCannotBeStartedSaysSo) {
   EXPECT_EQ(0, KLIBServiceIsRunning("kovanotifyd"));
   EXPECT_LT(KLIBServiceStart("no-such-service", 1), 0);
   EXPECT_LT(KLIBServiceIsRunning("no-such-service"), 0);
+  EXPECT_LT(KLIBServiceRestart("samba"), 0) << "an instance does not switch the host's own";
+  EXPECT_EQ(KOVA_ERR_NOT_SUPPORTED, KLIBCErrGet());
 }
 
 TEST_F(HostServiceTest, ProgramsRunWithoutAShell) {

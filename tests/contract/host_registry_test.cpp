@@ -1,0 +1,183 @@
+// What the Linux host keeps of MonitorQueue on disk, and what its reader makes of it.
+
+#include <signal.h>
+#include <sys/stat.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <filesystem>
+#include <set>
+#include <string>
+#include <thread>
+#include <vector>
+
+#include <gtest/gtest.h>
+
+#include <kova/error.h>
+#include <kova/notifyd.h>
+
+#include "platform/host/log.h"
+#include "platform/host/notify_registry.h"
+#include "tests/support/temp_dir.h"
+
+namespace ferrox::test {
+namespace {
+
+using kova::host::ReadRegistrations;
+using kova::host::RegistryFolder;
+using KOVA::KOVANOTIFYD::MonitorQueue;
+using std::string;
+
+std::vector<string>& LogLines() {
+  static std::vector<string> lines;
+  return lines;
+}
+
+class HostRegistryTest : public testing::Test {
+ protected:
+  void SetUp() override {
+    std::filesystem::remove_all(RegistryFolder());
+    std::filesystem::remove(RegistryFolder() + ".lock");
+    LogLines().clear();
+    kova::host::SetLogSink([](int, const char* line) { LogLines().emplace_back(line); });
+  }
+  void TearDown() override { kova::host::SetLogSink(nullptr); }
+
+  static Json::Value Document(const string& queue, int folders) {
+    Json::Value document;
+    document["queue"] = queue;
+    document["config"] = Json::arrayValue;
+    for (int i = 0; i < folders; ++i) {
+      Json::Value watch;
+      watch["path"] = "/v/share/folder number " + std::to_string(i);
+      watch["mask"] = 65478;
+      watch["ignore"].append("@eaDir");
+      document["config"].append(watch);
+    }
+    return document;
+  }
+  static bool Upsert(const string& queue, int folders) {
+    return MonitorQueue::Upsert(MonitorQueue(Document(queue, folders)), "fileindex", 1);
+  }
+  static string OnlyFile() {
+    string found;
+    for (const auto& entry : std::filesystem::directory_iterator(RegistryFolder())) {
+      EXPECT_EQ("", found) << entry.path();
+      found = entry.path();
+    }
+    return found;
+  }
+  static ino_t Inode(const string& path) {
+    struct stat info = {};
+    EXPECT_EQ(0, stat(path.c_str(), &info)) << path;
+    return info.st_ino;
+  }
+};
+
+TEST_F(HostRegistryTest, TheReaderGetsWhatWasRegistered) {
+  EXPECT_TRUE(ReadRegistrations().list.empty()) << "there is no folder yet";
+  EXPECT_TRUE(ReadRegistrations().problems.empty());
+  ASSERT_TRUE(Upsert("/q/b", 2));
+  ASSERT_TRUE(Upsert("/q/a", 0));
+  WriteFile(RegistryFolder() + "/left.json.Xy12ab", "[half of");
+  const auto registrations = ReadRegistrations();
+  EXPECT_TRUE(registrations.problems.empty());
+  ASSERT_EQ(2U, registrations.list.size());
+  EXPECT_EQ("/q/a", registrations.list[0].queue);
+  const kova::host::Registration& b = registrations.list[1];
+  EXPECT_EQ("fileindex", b.application);
+  EXPECT_EQ(1, b.type);
+  ASSERT_EQ(2U, b.watches.size());
+  EXPECT_EQ("/v/share/folder number 1", b.watches[1].path);
+  EXPECT_EQ(65478U, b.watches[1].mask);
+  EXPECT_EQ(std::vector<string>{"@eaDir"}, b.watches[1].ignore);
+}
+
+TEST_F(HostRegistryTest, OnlyAChangeIsWritten) {
+  ASSERT_TRUE(Upsert("/q/a", 2));
+  const string file = OnlyFile();
+  const ino_t first = Inode(file);
+  ASSERT_TRUE(Upsert("/q/a", 2));
+  EXPECT_EQ(first, Inode(file));
+  ASSERT_TRUE(Upsert("/q/a", 3));
+  EXPECT_NE(first, Inode(file));
+}
+
+TEST_F(HostRegistryTest, ADamagedFileIsNamedAndKept) {
+  ASSERT_TRUE(Upsert("/q/good", 1));
+  const string good = OnlyFile();
+  ASSERT_TRUE(Upsert("/q/bad", 1));
+  std::filesystem::path bad;
+  for (const auto& entry : std::filesystem::directory_iterator(RegistryFolder())) {
+    if (entry.path() != good) bad = entry.path();
+  }
+  for (const string& damage : {string(), string("null"), string("{\"queue\":\"/q/bad\",\"conf"), string(1000, '\0'),
+                               ReadFile(good), string(3000, '[')}) {
+    WriteFile(bad, damage);
+    LogLines().clear();
+    EXPECT_FALSE(Upsert("/q/bad", 1));
+    EXPECT_EQ(KOVA_ERR_BAD_CONFIGURATION, KLIBCErrGet());
+    EXPECT_FALSE(MonitorQueue::Delete("/q/bad", "fileindex", 1));
+    EXPECT_EQ(damage, ReadFile(bad));
+    ASSERT_EQ(2U, LogLines().size());
+    EXPECT_NE(string::npos, LogLines()[0].find(bad.string())) << LogLines()[0];
+    EXPECT_NE(string::npos, LogLines()[0].find("move it away")) << LogLines()[0];
+    const auto registrations = ReadRegistrations();
+    ASSERT_EQ(1U, registrations.list.size()) << "the others are used all the same";
+    EXPECT_EQ("/q/good", registrations.list[0].queue);
+    EXPECT_EQ(LogLines()[0], registrations.problems.at(0));
+  }
+  std::filesystem::remove(bad);
+  EXPECT_TRUE(Upsert("/q/bad", 1));
+}
+
+TEST_F(HostRegistryTest, WhatCannotBeWrittenLeavesTheOldRegistration) {
+  ASSERT_TRUE(Upsert("/q/a", 1));
+  const string lock = RegistryFolder() + ".lock", elsewhere = TestRoot() + "/elsewhere";
+  WriteFile(elsewhere, "");
+  std::filesystem::remove(lock);
+  std::filesystem::create_symlink(elsewhere, lock);
+  EXPECT_FALSE(Upsert("/q/a", 2)) << "the lock is a link";
+  EXPECT_EQ(KOVA_ERR_SYSTEM, KLIBCErrGet());
+  std::filesystem::remove(lock);
+  EXPECT_EQ(1U, ReadRegistrations().list.at(0).watches.size());
+  EXPECT_FALSE(MonitorQueue::Upsert(MonitorQueue(Document("/q/a", 1)), "a/b", 1)) << "no name of an application";
+  EXPECT_FALSE(MonitorQueue::Upsert(MonitorQueue(Document("/q/a", 1)), "", 1));
+}
+
+TEST_F(HostRegistryTest, ConcurrentRegistrationsAreAllKept) {
+  std::vector<std::thread> threads;
+  for (int t = 0; t < 4; ++t) {
+    threads.emplace_back([t] {
+      for (int i = 0; i < 10; ++i) {
+        EXPECT_TRUE(Upsert("/q/" + std::to_string(t * 10 + i), 1));
+        EXPECT_TRUE(Upsert("/q/common", t));
+      }
+    });
+  }
+  for (std::thread& thread : threads) thread.join();
+  EXPECT_EQ(41U, ReadRegistrations().list.size());
+}
+
+TEST_F(HostRegistryTest, AWriterThatIsKilledLeavesTheOldOrTheNew) {
+  ASSERT_TRUE(Upsert("/q/a", 1));
+  for (int round = 0; round < 20; ++round) {
+    const pid_t child = fork();
+    if (child == 0) {
+      for (int i = 0;; ++i) (void)Upsert("/q/a", i % 2 == 0 ? 400 : 1);
+    }
+    (void)usleep(static_cast<useconds_t>(1000 + round * 731));
+    ASSERT_EQ(0, kill(child, SIGKILL));
+    ASSERT_EQ(child, waitpid(child, nullptr, 0));
+    const auto registrations = ReadRegistrations();
+    EXPECT_TRUE(registrations.problems.empty());
+    ASSERT_EQ(1U, registrations.list.size());
+    const size_t watches = registrations.list[0].watches.size();
+    EXPECT_TRUE(watches == 400 || watches == 1) << watches;
+  }
+  EXPECT_TRUE(Upsert("/q/a", 3));
+  EXPECT_EQ(3U, ReadRegistrations().list.at(0).watches.size());
+}
+
+}  // namespace
+}  // namespace ferrox::test
