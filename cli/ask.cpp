@@ -1,6 +1,7 @@
 #include "cli/ask.h"
 
 #include "cli/command.h"
+#include "common/error.h"
 #include "common/json_util.h"
 #include "common/paths.h"
 #include "services/support/local_request.h"
@@ -17,9 +18,10 @@ constexpr std::chrono::seconds kLongestWait(120);
 struct Daemon {
   const char* name;
   const char* socket;
+  int unreachable;  ///< what the library throws when it cannot reach it
 };
-constexpr Daemon kEngine = {"the search engine", kElasticdSocket};
-constexpr Daemon kIndexDaemon = {"the index daemon", kFileIndexdSocket};
+constexpr Daemon kEngine = {"the search engine", kElasticdSocket, Error::kEngineUnreachable};
+constexpr Daemon kIndexDaemon = {"the index daemon", kFileIndexdSocket, Error::kInternal};
 
 Json::Value DataOf(const Daemon& daemon, const std::string& text) {
   Json::Value reply;
@@ -40,12 +42,14 @@ RequestResult Ask(const Daemon& daemon, const Json::Value& request, const std::s
 }
 
 Json::Value Answer(const Daemon& daemon, RequestResult result, const std::string& reply) {
+  const std::string code = " (error " + std::to_string(daemon.unreachable) + ")";
   if (result == RequestResult::kNotRunning) {
     throw Failure(std::string(daemon.name) + " does not run here (nothing answers at " + InstancePath(daemon.socket) +
-                  "); start it with 'fileindexctl up'");
+                  "); start it with 'fileindexctl up'" + code);
   }
   if (result == RequestResult::kNoAnswer) {
-    throw Failure(std::string(daemon.name) + " did not answer; see its log, or restart it ('fileindexctl down', 'up')");
+    throw Failure(std::string(daemon.name) + " did not answer; see its log, or restart it ('fileindexctl down', 'up')" +
+                  code);
   }
   return DataOf(daemon, reply);
 }
@@ -80,6 +84,16 @@ Json::Value AskIndexDaemonIfRunning(const std::string& type, const Json::Value& 
   std::string reply;
   const RequestResult result = Ask(kIndexDaemon, IndexDaemonRequest(type, data), kTerminatingZero, reply);
   return result == RequestResult::kNotRunning ? Json::Value() : Answer(kIndexDaemon, result, reply);
+}
+
+void RequireEngine() { (void)AskEngine("ping", Json::Value(Json::objectValue)); }
+
+void RequireIndexDaemon() { (void)AskIndexDaemon("status", Json::Value()); }
+
+Json::Value ShareName(const std::string& name) {
+  Json::Value data;
+  data["share_name"] = name;
+  return data;
 }
 
 }  // namespace ferrox::cli

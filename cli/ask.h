@@ -14,4 +14,12 @@ Json::Value AskIndexDaemon(const std::string& type, const Json::Value& data);
 /// The same, but null when the daemon does not run.
 Json::Value AskIndexDaemonIfRunning(const std::string& type, const Json::Value& data);
 
+/// For operations that need a daemon at their end: better nothing is begun without it.
+/// @throws Failure when it does not run or does not answer.
+void RequireEngine();
+void RequireIndexDaemon();
+
+/// {"share_name": name}: the data of the index daemon's commands.
+Json::Value ShareName(const std::string& name);
+
 }  // namespace ferrox::cli

@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <cstdint>
 #include <cstdlib>
 
 namespace ferrox::cli {
@@ -15,6 +16,14 @@ const Option* FindOption(const Command& command, const std::string& name) {
     if (name == option.name) return &option;
   }
   return name == kHelpOption.name ? &kHelpOption : nullptr;
+}
+
+void CheckChoice(const Option& option, const std::string& given) {
+  const std::string value = option.value;
+  if (value.find('|') == std::string::npos) return;
+  const std::vector<std::string> choices = Split(value, '|');
+  if (std::find(choices.begin(), choices.end(), given) != choices.end()) return;
+  throw UsageError(std::string(option.name) + " takes one of: " + value);
 }
 
 /// Takes the option at `at` and leaves `at` at its last word.
@@ -32,13 +41,37 @@ void TakeOption(const Command& command, const std::vector<std::string>& given, s
     if (at + 1 == given.size()) throw UsageError(name + " needs a value: " + name + " " + option->value);
     arguments.options[name] = given[++at];
   }
+  if (option->value != nullptr) CheckChoice(*option, arguments.options[name]);
 }
+
+/// How many words a command takes, read from its usage: "[...]" may be left out, "..." may be repeated.
+struct WordLimits {
+  explicit WordLimits(const Command& command) {
+    for (const std::string& word : Split(command.words, ' ')) {
+      if (word.empty()) continue;
+      if (word[0] != '[') ++least;
+      most = word.find("...") != std::string::npos ? SIZE_MAX : most + 1;
+    }
+  }
+  size_t least = 0;
+  size_t most = 0;
+};
 
 std::string OptionText(const Option& option) {
   return option.value == nullptr ? option.name : std::string(option.name) + " " + option.value;
 }
 
 }  // namespace
+
+std::vector<std::string> Split(const std::string& text, char separator) {
+  std::vector<std::string> parts;
+  size_t begin = 0;
+  for (size_t end = 0; end != std::string::npos; begin = end + 1) {
+    end = text.find(separator, begin);
+    parts.push_back(text.substr(begin, end - begin));
+  }
+  return parts;
+}
 
 std::string Arguments::Get(const std::string& name, const std::string& otherwise) const {
   const auto found = options.find(name);
@@ -70,9 +103,10 @@ Arguments ParseArguments(const Command& command, const std::vector<std::string>&
     }
   }
   if (arguments.Has(kHelpOption.name)) return arguments;
-  if (arguments.words.size() < command.words_min) throw UsageError("something is missing");
-  if (arguments.words.size() > command.words_max) {
-    throw UsageError("\"" + arguments.words[command.words_max] + "\" is one word too many");
+  const WordLimits limits(command);
+  if (arguments.words.size() < limits.least) throw UsageError("something is missing");
+  if (arguments.words.size() > limits.most) {
+    throw UsageError("\"" + arguments.words[limits.most] + "\" is one word too many");
   }
   return arguments;
 }

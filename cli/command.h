@@ -24,7 +24,7 @@ class Failure : public std::runtime_error {
 /// An option of a command, such as "--limit N".
 struct Option {
   const char* name;   ///< "--limit"
-  const char* value;  ///< "N"; null: the option takes none
+  const char* value;  ///< "N", or what can be given, "name|date"; null: the option takes none
   const char* help;
 };
 
@@ -42,31 +42,20 @@ struct Arguments {
 /// One row of the table of commands.
 struct Command {
   const char* name;   ///< one or two words
-  const char* words;  ///< for the usage line, for example "SHARE"
-  size_t words_min;
-  size_t words_max;
+  const char* words;  ///< as in the usage line: "SHARE [FOLDER]", "PATH..."; the names choose what is completed
   std::vector<Option> options;
   const char* help;
   int (*run)(const Arguments& arguments);
   bool changes = false;  ///< what it does needs the instance's folders
 };
 
-/// Sorts a command's words and options. "--" ends the options. @throws UsageError.
+/// Sorts a command's words and options, and checks how many words there are and the options of which the table lists
+/// the values. "--" ends the options. @throws UsageError.
 Arguments ParseArguments(const Command& command, const std::vector<std::string>& given);
 /// The command's own help text.
 std::string HelpFor(const Command& command);
 std::string UsageLine(const Command& command);
-
-int RunUp(const Arguments& arguments);
-int RunDown(const Arguments& arguments);
-int RunStatus(const Arguments& arguments);
-int RunPause(const Arguments& arguments);
-int RunResume(const Arguments& arguments);
-int RunShareAdd(const Arguments& arguments);
-int RunShareList(const Arguments& arguments);
-int RunShareRemove(const Arguments& arguments);
-int RunIndex(const Arguments& arguments);
-int RunSearch(const Arguments& arguments);
-int RunQueueShow(const Arguments& arguments);
+/// The parts of a text between single separators: what an option takes ("name|date"), a command's words.
+std::vector<std::string> Split(const std::string& text, char separator);
 
 }  // namespace ferrox::cli

@@ -6,12 +6,15 @@
 #include <cstdio>
 
 #include "cli/ask.h"
-#include "cli/command.h"
+#include "cli/command_table.h"
+#include "cli/configuration_change.h"
 #include "cli/escape.h"
 #include "cli/format.h"
 #include "cli/progress.h"
 #include "common/error.h"
 #include "common/file_util.h"
+#include "fileindex/folder_mgr.h"
+#include "fileindex/index_mgr.h"
 #include "fileindex/optree.h"
 #include "fileindex/queue_mgr.h"
 #include "fileindex/status_mgr.h"
@@ -35,20 +38,9 @@ struct Share {
 };
 
 Share OpenShare(const std::string& name) {
-  try {
-    const sdk::SDKShare share(name);
-    return {name, share.GetPath(), share.GetQueuePath()};
-  } catch (const Error& error) {
-    if (error.Code() != Error::kNoSuchShare) throw;
-    throw Failure("there is no share \"" + name + "\"; 'fileindexctl share list' shows them");
-  }
-}
-
-Json::Value ShareName(const Share& share) {
-  Json::Value data;
-  data["share_name"] = share.name;
-  data["is_upsert"] = true;
-  return data;
+  const sdk::SDKShare share(name);
+  RequireIndexed(name, fileindex::FolderMgr());
+  return {name, share.GetPath(), share.GetQueuePath()};
 }
 
 /// A reindex that is being carried out may have passed by what has changed since, yet the library takes it for one that
@@ -64,7 +56,9 @@ void QueueReindex(const Share& share) {
   } catch (const Error& error) {
     if (error.Code() != Error::kMalformedEvent && error.Code() != Error::kBadArgument) throw;
   }
-  (void)AskIndexDaemonIfRunning("notify_setting_changed", ShareName(share));
+  Json::Value changed = ShareName(share.name);
+  changed["is_upsert"] = true;
+  (void)AskIndexDaemonIfRunning("notify_setting_changed", changed);
 }
 
 Json::Value ShareStatusOf(const std::string& name) {
@@ -133,6 +127,21 @@ int RunIndex(const Arguments& arguments) {
   (void)printf("%s: %s files examined, %s indexed, %s removed in %s\n", EscapeForTerminal(share.name).c_str(),
                Count(UintOf(after["comparison"], "examined")).c_str(), Count(Grown(before, after, "written")).c_str(),
                Count(Grown(before, after, "deleted")).c_str(), Duration(took.count()).c_str());
+  return kDone;
+}
+
+int RunSuggestRefresh(const Arguments& arguments) {
+  const fileindex::FolderMgr configured;
+  std::vector<std::string> shares = arguments.words;
+  for (const std::string& share : shares) RequireIndexed(sdk::SDKShare(share).GetName(), configured);
+  if (shares.empty()) {
+    for (const std::string& share : configured.GetIndexedShares()) shares.push_back(share);
+  }
+  std::vector<std::string> databases;
+  for (const std::string& share : shares) databases.push_back(sdk::SDKShare(share).GetDBName());
+  RequireEngine();
+  fileindex::UpdateTermSuggestion(databases);
+  (void)printf("suggestions of %s shares are new\n", Count(shares.size()).c_str());
   return kDone;
 }
 

@@ -5,7 +5,7 @@
 #include <cstring>
 #include <sstream>
 
-#include "cli/command.h"
+#include "cli/command_table.h"
 #include "cli/escape.h"
 #include "fileindex/optree.h"
 

@@ -4,11 +4,12 @@
 #include <kova/service.h>
 
 #include "cli/ask.h"
-#include "cli/command.h"
+#include "cli/command_table.h"
 #include "cli/format.h"
 #include "common/clock.h"
 #include "common/error.h"
 #include "common/paths.h"
+#include "fileindex/index_mgr.h"
 #include "fileindex/status_mgr.h"
 #include "platform/host/child_service.h"
 
@@ -65,6 +66,15 @@ int RunDown(const Arguments&) {
     const bool ran = KLIBServiceIsRunning(service.name) == 1;
     if (service.stop(service.name, service.option) < 0) ThrowProblem(service, "stopped");
     (void)printf("%s: %s\n", service.label, ran ? "stopped" : "does not run");
+  }
+  return kDone;
+}
+
+/// Goes by the list of indexed folders, and never fails for a service: what runs then is told.
+int RunPrepare(const Arguments&) {
+  fileindex::PrepareServices();
+  for (const Service& service : kServices) {
+    (void)printf("%s: %s\n", service.label, KLIBServiceIsRunning(service.name) == 1 ? "runs" : "does not run");
   }
   return kDone;
 }

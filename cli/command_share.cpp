@@ -1,15 +1,15 @@
-#include <climits>
+#include <algorithm>
 #include <cstdio>
-#include <cstdlib>
 
 #include "cli/ask.h"
-#include "cli/command.h"
+#include "cli/command_table.h"
+#include "cli/configuration_change.h"
 #include "cli/escape.h"
 #include "common/error.h"
 #include "common/file_util.h"
 #include "fileindex/elastic/elastic_control.h"
-#include "fileindex/optree.h"
-#include "fileindex/util.h"
+#include "fileindex/folder_mgr.h"
+#include "fileindex/index_mgr.h"
 #include "platform/host/share_table.h"
 #include "sdk/share.h"
 
@@ -17,53 +17,71 @@ namespace ferrox::cli {
 
 namespace {
 
-Json::Value ShareName(const std::string& name) {
-  Json::Value data;
-  data["share_name"] = name;
-  return data;
-}
-
 /// The folder without links, "." and "..", which is what a share's folder must be.
 std::string RealFolder(const std::string& folder) {
   const std::string real = RealPath(folder);
-  if (real.empty()) throw Failure(EscapeForTerminal(folder) + ": no such folder; make it first");
-  if (!IsDirExist(real, false)) throw Failure(EscapeForTerminal(folder) + " is no folder; a share must be one");
+  if (real.empty()) throw Failure(folder + ": no such folder; make it first");
+  if (!IsDirExist(real, false)) throw Failure(folder + " is no folder; a share must be one");
   return real;
 }
 
-std::vector<kova::host::ShareEntry> Shares() {
-  try {
-    return kova::host::ListShares();
-  } catch (const kova::host::ShareTableError& error) {
-    throw Failure(error.what());
+/// The paths of the share's indexed folders.
+Json::Value FoldersOf(const std::string& share) {
+  const fileindex::FolderMgr configured;
+  Json::Value paths(Json::arrayValue);
+  for (const auto& folder : configured.GetFolders()) {
+    if (folder->GetShare() == share) paths.append(folder->GetPath());
   }
+  return paths;
 }
 
-/// The worker goes first, since it would make a dropped index anew. The queue is dropped with the share: it would be
-/// taken for that of a later share of the same folder.
-void RemoveShare(const std::string& name) {
-  std::string queue_path;
-  try {
-    queue_path = sdk::SDKShare(name).GetQueuePath();
-  } catch (const Error& error) {
-    if (error.Code() != Error::kNoSuchShare) throw;
-    throw Failure("there is no share \"" + EscapeForTerminal(name) + "\"; 'fileindexctl share list' shows them");
-  }
-  (void)AskEngine("ping", Json::Value(Json::objectValue));
+/// What may be left of a share without indexed folders. The worker goes first, since it would make a dropped index
+/// anew; the queue would be taken for that of a later share of the same folder.
+void DropRemains(const std::string& name, const std::string& queue_path) {
   (void)AskIndexDaemonIfRunning("worker_delete", ShareName(name));
   try {
     fileindex::elastic::ShareIndexDelete(name);
   } catch (const Error& error) {
     if (error.Code() != Error::kEngineNoSuchIndex) throw;
   }
-  try {
-    kova::host::RemoveShare(name);
-  } catch (const kova::host::ShareTableError& error) {
-    throw Failure(error.what());
-  }
   (void)Unlink(queue_path);
   (void)Unlink(queue_path + ".tmp");
+}
+
+void RemoveShare(const std::string& name) {
+  const std::string queue_path = sdk::SDKShare(name).GetQueuePath();
+  RequireEngine();
+  const Json::Value folders = FoldersOf(name);
+  if (!folders.empty()) RequireIndexDaemon();
+  if (!folders.empty()) ChangeConfiguration([&] { fileindex::FolderDelete(folders); });
+  DropRemains(name, queue_path);
+  kova::host::RemoveShare(name);
   (void)printf("share %s and its index are gone; its folder is as it was\n", EscapeForTerminal(name).c_str());
+}
+
+/// True when the folder is that share already.
+bool MakeWay(const kova::host::ShareEntry& entry, bool replace) {
+  for (const auto& known : kova::host::ListShares()) {
+    if (known.name != entry.name) continue;
+    if (known.path == entry.path) return true;
+    if (replace) RemoveShare(known.name);
+  }
+  return false;
+}
+
+/// The share itself stays when its indexing cannot begin.
+void IndexWholeShare(const std::string& name) {
+  const std::string path = "/" + name;
+  Json::Value list(Json::arrayValue);
+  list.append(fileindex::Folder(path, name, true, true, true, true, false, false).GetData());
+  try {
+    RequireEngine();
+    ChangeConfiguration([&] { fileindex::FolderAdd(list, false); });
+  } catch (const Failure& failure) {
+    if (!FoldersOf(name).empty()) throw;
+    throw Failure(std::string(failure.what()) + "; the share is there, but not indexed: 'fileindexctl folder add " +
+                  path + "' does that later");
+  }
 }
 
 }  // namespace
@@ -72,29 +90,17 @@ int RunShareAdd(const Arguments& arguments) {
   kova::host::ShareEntry entry;
   entry.path = RealFolder(arguments.words[0]);
   entry.name = arguments.Get("--name", Basename(entry.path));
-  for (const auto& known : Shares()) {
-    if (known.name != entry.name) continue;
-    if (known.path == entry.path) {
-      (void)printf("%s is a share already\n", EscapeForTerminal(entry.path).c_str());
-      return kDone;
-    }
-    if (arguments.Has("--replace")) RemoveShare(known.name);
-  }
-  try {
-    kova::host::AddShare(entry);
-  } catch (const kova::host::ShareTableError& error) {
-    throw Failure(error.what());
-  }
-  fileindex::AddCustomEvent(fileindex::EVENT_REINDEX, entry.path, "", Json::Value());
-  const bool told = !AskIndexDaemonIfRunning("status", Json::Value()).isNull();
-  if (told) (void)AskIndexDaemon("worker_create", ShareName(entry.name));
-  (void)printf("share %s: %s%s\n", EscapeForTerminal(entry.name).c_str(), EscapeForTerminal(entry.path).c_str(),
-               told ? "" : " (it will be indexed when the daemons run: 'fileindexctl up')");
+  const bool known = MakeWay(entry, arguments.Has("--replace"));
+  if (!known) kova::host::AddShare(entry);
+  const bool index = !arguments.Has("--no-index") && FoldersOf(entry.name).empty();
+  if (index) IndexWholeShare(entry.name);
+  (void)printf("share %s: %s%s%s\n", EscapeForTerminal(entry.name).c_str(), EscapeForTerminal(entry.path).c_str(),
+               known ? " (a share already)" : "", index ? ", all of it is indexed" : "");
   return kDone;
 }
 
 int RunShareList(const Arguments& arguments) {
-  const auto shares = Shares();
+  const auto shares = kova::host::ListShares();
   Json::Value list(Json::arrayValue);
   for (const auto& share : shares) {
     Json::Value entry;

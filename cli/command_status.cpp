@@ -1,11 +1,13 @@
 #include <cstdio>
+#include <map>
 
 #include "cli/ask.h"
-#include "cli/command.h"
+#include "cli/command_table.h"
 #include "cli/escape.h"
 #include "cli/format.h"
 #include "cli/progress.h"
 #include "common/clock.h"
+#include "fileindex/folder_mgr.h"
 
 namespace ferrox::cli {
 
@@ -22,10 +24,30 @@ void PrintReasons(const char* title, const Json::Value& counts, const Json::Valu
   }
 }
 
+std::string FoldersText(uint64_t folders) { return Count(folders) + (folders == 1 ? " folder" : " folders"); }
+
+/// How changes are noticed.
+std::string WatchText(const std::string& watch) {
+  return watch == "none" ? "changes are not watched, 'fileindexctl index' looks for them" : "changes by " + watch;
+}
+
+void PrintWork(const Json::Value& share) {
+  (void)printf("    %s", EscapeForTerminal(Progress::Text(share, 0)).c_str());
+  if (share.isMember("folders")) (void)printf("; %s", FoldersText(UintOf(share, "folders")).c_str());
+  if (share.isMember("watch")) (void)printf("; %s", EscapeForTerminal(WatchText(TextOf(share, "watch"))).c_str());
+  (void)printf("\n    done since the daemon started: %s indexed, %s removed", Count(UintOf(share, "written")).c_str(),
+               Count(UintOf(share, "deleted")).c_str());
+  if (share["rate"].isNumeric() && share["rate"].asDouble() >= 0.5) {
+    (void)printf(", now %s a second", Count(static_cast<uint64_t>(share["rate"].asDouble() + 0.5)).c_str());
+  }
+  if (UintOf(share, "failed") != 0) (void)printf(", %s failed", Count(UintOf(share, "failed")).c_str());
+  (void)printf("\n");
+}
+
 void PrintShare(const Json::Value& share) {
   (void)printf("share %s: %s\n", EscapeForTerminal(TextOf(share, "share")).c_str(),
                EscapeForTerminal(TextOf(share, "path")).c_str());
-  (void)printf("    %s\n", EscapeForTerminal(Progress::Text(share, 0)).c_str());
+  PrintWork(share);
   const Json::Value& index = share["index"];
   if (index.isObject()) {
     (void)printf("    index: %s documents, %s, %s\n", Count(UintOf(index, "documents")).c_str(),
@@ -55,6 +77,24 @@ std::string PauseText(const Json::Value& status) {
   return until == 0 ? ", paused until 'fileindexctl resume'" : ", paused until " + Date(until);
 }
 
+/// The shares with indexed folders that nothing works on: {"share", "folders", "paused"} each.
+Json::Value RestingShares(const Json::Value& daemon) {
+  std::map<std::string, Json::Value> shares;
+  const fileindex::FolderMgr configured;
+  for (const auto& folder : configured.GetFolders()) {
+    Json::Value& share = shares[folder->GetShare()];
+    share["share"] = folder->GetShare();
+    share["folders"] = Json::UInt64(UintOf(share, "folders") + 1);
+    share["paused"] = folder->IsPaused() || share["paused"].asBool();
+  }
+  if (!daemon.isNull()) {
+    for (const Json::Value& busy : daemon["shares"]) shares.erase(TextOf(busy, "share"));
+  }
+  Json::Value list(Json::arrayValue);
+  for (const auto& [name, share] : shares) list.append(share);
+  return list;
+}
+
 /// The engine's "ping" reply, or null when it does not run.
 Json::Value EngineState() {
   try {
@@ -69,10 +109,12 @@ Json::Value EngineState() {
 int RunStatus(const Arguments& arguments) {
   const Json::Value engine = EngineState();
   const Json::Value daemon = AskIndexDaemonIfRunning("status", Json::Value());
+  const Json::Value resting = RestingShares(daemon);
   if (arguments.Has("--json")) {
     Json::Value json;
     json["engine"] = engine;
     json["index_daemon"] = daemon;
+    json["resting_shares"] = resting;
     (void)printf("%s\n", ToScriptJson(json).c_str());
     return kDone;
   }
@@ -86,6 +128,11 @@ int RunStatus(const Arguments& arguments) {
                                                .c_str());
   if (!daemon.isNull()) {
     for (const Json::Value& share : daemon["shares"]) PrintShare(share);
+  }
+  for (const Json::Value& share : resting) {
+    (void)printf("share %s: %s; %s\n", EscapeForTerminal(TextOf(share, "share")).c_str(),
+                 FoldersText(UintOf(share, "folders")).c_str(),
+                 share["paused"].asBool() ? "paused until 'fileindexctl share resume'" : "nothing works on it now");
   }
   return kDone;
 }

@@ -29,3 +29,9 @@ install(FILES ${CMAKE_BINARY_DIR}/libfileindex.pc DESTINATION ${CMAKE_INSTALL_LI
 
 install(DIRECTORY ${CMAKE_SOURCE_DIR}/docs/man/ DESTINATION ${CMAKE_INSTALL_MANDIR}/man1 FILES_MATCHING PATTERN "*.1")
 install(DIRECTORY ${CMAKE_SOURCE_DIR}/docs/man/ DESTINATION ${CMAKE_INSTALL_MANDIR}/man8 FILES_MATCHING PATTERN "*.8")
+
+# Where the shells look for completions by themselves.
+install(FILES ${CMAKE_SOURCE_DIR}/packaging/completions/fileindexctl.bash RENAME fileindexctl
+        DESTINATION ${CMAKE_INSTALL_DATADIR}/bash-completion/completions)
+install(FILES ${CMAKE_SOURCE_DIR}/packaging/completions/_fileindexctl
+        DESTINATION ${CMAKE_INSTALL_DATADIR}/zsh/site-functions)

@@ -2,13 +2,18 @@
 
 #include <gtest/gtest.h>
 
+#include "cli/explain.h"
 #include "cli/format.h"
 #include "cli/progress.h"
 
 namespace ferrox::cli {
 namespace {
 
-const Command kCommand = {"do", "WORD...", 1, 2, {{"--limit", "N", ""}, {"--json", nullptr, ""}}, "Does.", nullptr};
+const Command kCommand = {"do",
+                          "WORD [WORD]",
+                          {{"--limit", "N", ""}, {"--json", nullptr, ""}, {"--sort", "name|date", ""}},
+                          "Does.",
+                          nullptr};
 
 TEST(CommandTest, OptionsAndWordsMayBeMixed) {
   const Arguments arguments = ParseArguments(kCommand, {"a", "--limit", "5", "--json", "--", "--b"});
@@ -20,12 +25,49 @@ TEST(CommandTest, OptionsAndWordsMayBeMixed) {
 
 TEST(CommandTest, WrongUsageIsRefused) {
   const std::vector<std::vector<std::string>> wrong = {
-      {}, {"a", "b", "c"}, {"a", "--unknown"}, {"a", "--limit"}, {"a", "--json=1"}};
+      {}, {"a", "b", "c"}, {"a", "--unknown"}, {"a", "--limit"}, {"a", "--json=1"}, {"a", "--sort=nam"}};
   for (const auto& given : wrong) EXPECT_THROW(ParseArguments(kCommand, given), UsageError);
   for (const char* number : {"", "x", "5x", "0", "101", "99999999999999999999"}) {
     const Arguments arguments = ParseArguments(kCommand, {"a", "--limit", number});
     EXPECT_THROW(arguments.Number("--limit", 10, 1, 100), UsageError) << number;
   }
+}
+
+TEST(CommandTest, UsageTellsHowManyWordsThereMayBe) {
+  const struct {
+    const char* words;
+    size_t least, most;
+  } rows[] = {{"", 0, 0}, {"A", 1, 1}, {"[A]", 0, 1}, {"A B", 2, 2}, {"A [B]", 1, 2}, {"A...", 1, 9}, {"[A...]", 0, 9}};
+  for (const auto& row : rows) {
+    SCOPED_TRACE(row.words);
+    const Command command = {"do", row.words, {}, "Does.", nullptr};
+    for (size_t count = 0; count < 9; ++count) {
+      const std::vector<std::string> given(count, "x");
+      if (count < row.least || count > row.most) {
+        EXPECT_THROW(ParseArguments(command, given), UsageError) << count;
+      } else {
+        EXPECT_EQ(given, ParseArguments(command, given).words);
+      }
+    }
+  }
+}
+
+TEST(ExplainTest, SentenceNamesThingRemedyAndCode) {
+  const struct {
+    Error error;
+    const char* text;
+  } rows[] = {
+      {Error(Error::kNoSuchShare, "x"),
+       "there is no share \"x\"; 'fileindexctl share list' shows the shares (error 800)"},
+      {Error(Error::kSaveFailed, "/etc/f"),
+       "cannot write /etc/f; see that its folder can be written and has space (error 505)"},
+      {Error(Error::kInternal, "write failed, reason=No such file or directory"),
+       "write failed, reason=No such file or directory; the index daemon does not answer; 'fileindexctl up' starts it "
+       "(error 502)"},
+      {Error(static_cast<Error::ErrorCode>(1410)), "that did not work (error 1410)"},
+  };
+  for (const auto& row : rows) EXPECT_EQ(row.text, Explain(row.error));
+  EXPECT_EQ("no; because (error 120)", Explain(Error(Error::kBadArgument, "no"), "because"));
 }
 
 TEST(ProgressTest, TextGrowsWithWhatIsKnown) {

@@ -107,11 +107,19 @@ class Instance:
 
     # Shares and queues.
 
-    def add_share(self, name):
+    def add_share(self, name, *options):
         folder = f"{os.path.realpath(self.root)}/vol/{name}"
         os.makedirs(folder)
-        self.ctl("share", "add", folder)
+        self.ctl("share", "add", folder, *options)
         return folder
+
+    def folders(self):
+        """The list of indexed folders, as the file holds it."""
+        try:
+            with open(f"{self.root}/var/packages/Ferrox/etc/fileindex.folders", encoding="utf-8") as file:
+                return json.load(file)
+        except FileNotFoundError:
+            return []
 
     def queue_path(self, folder):
         name = folder.strip("/").replace("/", "+")

@@ -18,6 +18,7 @@ EXCEPTIONS = {("fileindex/custom_event.cpp", "fileindex/queue_mgr.h"),
               ("fileindex/custom_event.cpp", "fileindex/status_mgr.h"),
               ("fileindex/queue_mgr.cpp", "fileindex/folder_mgr.h"),
               ("cli/command_share.cpp", "platform/host/share_table.h"),
+              ("cli/command_share_move.cpp", "platform/host/share_table.h"),
               ("services/fileindexd/main.cpp", "platform/host/share_table.h"),
               ("cli/command_service.cpp", "platform/host/child_service.h")}
 

@@ -1,0 +1,159 @@
+#include <sys/stat.h>
+
+#include <algorithm>
+#include <cstdio>
+#include <optional>
+
+#include <json/value.h>
+
+#include "cli/ask.h"
+#include "cli/command_table.h"
+#include "cli/configuration_change.h"
+#include "cli/escape.h"
+#include "cli/folder_path.h"
+#include "cli/format.h"
+#include "cli/kinds.h"
+#include "common/file_util.h"
+#include "fileindex/folder_mgr.h"
+#include "fileindex/index_mgr.h"
+#include "fileindex/util.h"
+
+namespace ferrox::cli {
+
+namespace {
+
+using fileindex::FolderMgr;
+
+std::vector<std::string> SharePaths(const Arguments& arguments, const FolderMgr& configured) {
+  std::vector<std::string> paths;
+  for (const std::string& word : arguments.words) paths.push_back(ToSharePath(word, configured));
+  return paths;
+}
+
+Json::Value ToArray(const std::vector<std::string>& paths) {
+  Json::Value array(Json::arrayValue);
+  for (const std::string& path : paths) array.append(path);
+  return array;
+}
+
+/// The stored form of each folder: what is given, and of an entry that is there already the rest.
+Json::Value FolderEntries(const Arguments& arguments, const std::vector<std::string>& paths, const Kinds& kinds,
+                          const FolderMgr& configured) {
+  if (arguments.Has("--name") && paths.size() != 1) throw UsageError("--name goes with one folder");
+  Json::Value list(Json::arrayValue);
+  for (const std::string& path : paths) {
+    const std::string name = arguments.Get("--name", Basename(path));
+    Json::Value entry = fileindex::Folder(path, name, false, false, false, false, false, false).GetData();
+    for (const auto& folder : configured.GetFolders()) {
+      if (folder->GetPath() == path) entry = folder->GetData();
+    }
+    if (arguments.Has("--name")) entry["name"] = name;
+    kinds.Store(entry);
+    list.append(entry);
+  }
+  return list;
+}
+
+/// The library takes any path that can be indexed; a file would be one.
+void RequireNoFiles(const std::vector<std::string>& paths) {
+  for (const std::string& path : paths) {
+    struct stat status = {};
+    const std::string full_path = fileindex::GetFullPath(path);
+    if (lstat(full_path.c_str(), &status) == 0 && S_ISREG(status.st_mode)) {
+      throw Failure(path + " is a file; give the folder that holds it");
+    }
+  }
+}
+
+int Upsert(const Arguments& arguments, const Kinds& kinds, void (*upsert)(const Json::Value&, bool)) {
+  const FolderMgr configured;
+  const std::vector<std::string> paths = SharePaths(arguments, configured);
+  RequireNoFiles(paths);
+  const Json::Value list = FolderEntries(arguments, paths, kinds, configured);
+  RequireEngine();
+  ChangeConfiguration([&] { upsert(list, false); });
+  for (const std::string& path : paths) {
+    (void)printf("%s: %s\n", EscapeForTerminal(path).c_str(), kinds.Text().c_str());
+  }
+  (void)printf("the index follows; 'fileindexctl status' shows how far it is\n");
+  return kDone;
+}
+
+std::string FolderText(const Json::Value& folder) {
+  std::string text = EscapeForTerminal(TextOf(folder, "path")) + "\n    " + Kinds(folder).Text();
+  const std::string name = TextOf(folder, "name");
+  if (name != Basename(TextOf(folder, "path"))) text += ", \"" + EscapeForTerminal(name) + "\"";
+  if (folder["paused"].asBool()) text += ", paused";
+  const std::string volume = TextOf(folder, "volume_to_be_clean");
+  if (!volume.empty() && folder["paused"].asBool()) text += " with the volume " + EscapeForTerminal(volume);
+  if (!folder["additional"].isObject()) return text + "\n";
+  const Json::Value& status = folder["additional"]["status"];
+  text += ", " + TextOf(status, "text");
+  return text + (TextOf(status, "desc").empty() ? "" : " (" + TextOf(status, "desc") + ")") + "\n";
+}
+
+}  // namespace
+
+int RunFolderAdd(const Arguments& arguments) {
+  return Upsert(arguments, Kinds(arguments.Get("--kinds", "all")), &fileindex::FolderAdd);
+}
+
+int RunFolderSet(const Arguments& arguments) {
+  if (!arguments.Has("--kinds")) throw UsageError("--kinds is needed: of which kinds of files to index the content");
+  return Upsert(arguments, Kinds(arguments.Get("--kinds")), &fileindex::FolderSet);
+}
+
+int RunFolderDelete(const Arguments& arguments) {
+  const std::vector<std::string> paths = SharePaths(arguments, FolderMgr());
+  RequireEngine();
+  RequireIndexDaemon();
+  ChangeConfiguration([&] { fileindex::FolderDelete(ToArray(paths)); });
+  for (const std::string& path : paths) {
+    (void)printf("%s is no longer indexed; its files are as they were\n", EscapeForTerminal(path).c_str());
+  }
+  if (FolderMgr().GetFolders().empty()) (void)printf("no indexed folder is left: indexing has stopped\n");
+  return kDone;
+}
+
+int RunFolderReindex(const Arguments& arguments) {
+  const FolderMgr configured;
+  const std::vector<std::string> paths = SharePaths(arguments, configured);
+  for (const std::string& path : paths) RequireIndexed(fileindex::GetShareNameByPath(path), configured);
+  fileindex::FolderReindex(ToArray(paths));
+  for (const std::string& path : paths) {
+    (void)printf("queued: %s will be compared with its index\n", EscapeForTerminal(path).c_str());
+  }
+  return kDone;
+}
+
+int RunFolderGet(const Arguments& arguments) {
+  Json::Value folder;
+  fileindex::FolderGet(folder, ToSharePath(arguments.words[0], FolderMgr()));
+  (void)printf("%s", arguments.Has("--json") ? (ToScriptJson(folder) + "\n").c_str() : FolderText(folder).c_str());
+  return kDone;
+}
+
+int RunFolderList(const Arguments& arguments) {
+  constexpr long long kMost = fileindex::kFileIndexFoldersMax;
+  const auto offset = static_cast<unsigned>(arguments.Number("--offset", 0, 0, kMost));
+  const auto limit = static_cast<unsigned>(arguments.Number("--limit", kMost, 0, kMost));
+  Json::Value additional(Json::arrayValue);
+  if (arguments.Has("--status")) additional.append("status");
+  Json::Value page;
+  fileindex::FolderList(page, offset, limit, arguments.Get("--sort"), arguments.Has("--desc") ? "desc" : "asc",
+                        additional);
+  const bool none = UintOf(page, "total") == 0;
+  if (arguments.Has("--json")) {
+    (void)printf("%s\n", ToScriptJson(page).c_str());
+    return none ? kNothingFound : kDone;
+  }
+  for (const Json::Value& folder : page["folder"]) (void)printf("%s", FolderText(folder).c_str());
+  if (none) (void)fprintf(stderr, "no folder is indexed; choose one with 'fileindexctl folder add PATH'\n");
+  const auto shown = static_cast<uint64_t>(page["folder"].size());
+  if (!none && shown != UintOf(page, "total")) {
+    (void)printf("%s of %s shown\n", Count(shown).c_str(), Count(UintOf(page, "total")).c_str());
+  }
+  return none ? kNothingFound : kDone;
+}
+
+}  // namespace ferrox::cli

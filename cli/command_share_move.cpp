@@ -1,0 +1,233 @@
+#include <sys/stat.h>
+
+#include <algorithm>
+#include <cstdio>
+#include <functional>
+
+#include <kova/file_index.h>
+#include <kova/notifyd.h>
+
+#include "cli/ask.h"
+#include "cli/command_table.h"
+#include "cli/escape.h"
+#include "cli/explain.h"
+#include "cli/folder_path.h"
+#include "common/error.h"
+#include "common/file_util.h"
+#include "common/log.h"
+#include "fileindex/elastic/elastic_control.h"
+#include "fileindex/folder_mgr.h"
+#include "fileindex/index_mgr.h"
+#include "fileindex/optree.h"
+#include "fileindex/status_mgr.h"
+#include "fileindex/util.h"
+#include "platform/host/share_table.h"
+#include "sdk/share.h"
+
+/// A share gets another name or another folder. The table of shares goes first, since the library asks it where the
+/// share is; each step may be repeated, so that the same command finishes what an earlier run has begun.
+namespace ferrox::cli {
+
+namespace {
+
+using kova::host::ShareEntry;
+
+struct Move {
+  std::string old_name;
+  std::string new_name;
+  std::string old_path;
+  std::string new_path;
+};
+
+bool Exists(const std::string& path) {
+  struct stat status = {};
+  return lstat(path.c_str(), &status) == 0;
+}
+
+bool IsShare(const std::string& name) {
+  const std::vector<std::string> shares = sdk::SDKShare::Enum();
+  return std::find(shares.begin(), shares.end(), name) != shares.end();
+}
+
+/// The share's entry in the instance's own table, if it is there.
+std::vector<ShareEntry> OwnEntry(const std::string& name) {
+  std::vector<ShareEntry> entries = kova::host::ListShares();
+  entries.erase(std::remove_if(entries.begin(), entries.end(), [&](const ShareEntry& e) { return e.name != name; }),
+                entries.end());
+  return entries;
+}
+
+std::string QueueOf(const std::string& share_path) {
+  char path[4096] = {};
+  FERROX_FAIL_IF(0 > FILEIDXQueuePathCompose(share_path.c_str(), path, sizeof(path)), Error::kInternal,
+                 "FILEIDXQueuePathCompose failed, share_path=" + share_path);
+  return path;
+}
+
+bool HasIndex(const std::string& share) {
+  const std::string id = fileindex::elastic::GetFileIndexID(share);
+  for (const Json::Value& index : AskEngine("index_list", Json::Value(Json::objectValue))) {
+    if (index["id"].asString() == id) return true;
+  }
+  return false;
+}
+
+bool IsPaused(const std::string& share) {
+  const fileindex::FolderMgr configured;
+  const auto& folders = configured.GetFolders();
+  return std::any_of(folders.begin(), folders.end(),
+                     [&](const auto& folder) { return folder->IsPaused() && folder->GetShare() == share; });
+}
+
+void RefuseSharesBelow(const ShareEntry& entry) {
+  for (const ShareEntry& other : kova::host::ListShares()) {
+    if (other.name != entry.name && StringStartWith(other.path, entry.path + "/")) {
+      throw Failure("share " + other.name + " lies in share " + entry.name +
+                    "; remove it first ('fileindexctl share remove " + other.name + "'), and add it again afterwards");
+    }
+  }
+}
+
+/// Renames the share's folder, unless somebody has done that already. @return whether it was done here.
+bool RenameFolder(const std::string& from, const std::string& to) {
+  const bool old_there = Exists(from);
+  const bool new_there = Exists(to);
+  if (old_there && new_there) throw Failure(to + " exists already; move it away, or choose another name");
+  if (!old_there && !new_there) throw Failure(from + " is not there; bring it back first");
+  if (new_there) return false;
+  if (rename(from.c_str(), to.c_str()) != 0) {
+    throw Failure("cannot rename " + from + " to " + to + ": " + ErrnoText() +
+                  "; rename it yourself, then run this command again");
+  }
+  (void)SyncFolder(Dirname(to));
+  return true;
+}
+
+void RenameInTable(const Move& move) {
+  const bool renamed_here = RenameFolder(move.old_path, move.new_path);
+  try {
+    kova::host::RenameShare(move.old_name, move.new_name, move.new_path);
+  } catch (const kova::host::ShareTableError&) {
+    if (renamed_here) (void)rename(move.new_path.c_str(), move.old_path.c_str());
+    throw;
+  }
+}
+
+/// A run that was interrupted may have got to any of its steps, and a daemon that was started since may have made an
+/// empty index of the new name.
+void RenameIndex(const Move& move) {
+  try {
+    fileindex::ShareRename(move.old_name, move.new_name);
+  } catch (const Error& error) {
+    const bool both = error.Code() == Error::kEngineIndexExists;
+    if (!both && error.Code() != Error::kEngineNoSuchIndex) throw;
+    if (both) fileindex::elastic::ShareIndexDelete(move.old_name);
+    fileindex::AddCustomEvent(fileindex::EVENT_RENAME, move.new_path, move.old_path, Json::Value());
+  }
+  const int bits = fileindex::StatusMgr().GetShareStatus(move.old_name);
+  if (bits == 0) return;
+  fileindex::StatusMgr().SetShareStatus(move.new_name, bits);
+  fileindex::StatusMgr().ClearShareStatus(move.old_name);
+}
+
+/// Registers the new place and starts the share's worker there. A daemon that does not run looks when it starts.
+void GoOn(const std::string& share) {
+  const bool runs = !AskIndexDaemonIfRunning("status", Json::Value()).isNull();
+  try {
+    fileindex::ShareResume(share);
+  } catch (const Error& error) {
+    if (runs || error.Code() != Error::kInternal) throw;
+  }
+}
+
+/// What comes once the platform has the share at its new place. The lines of the old queue are superseded by the event
+/// of the move, which has both places compared with the index.
+void Follow(const Move& move, void (*move_index)(const Move& move), const std::string& again) {
+  try {
+    const bool paused = IsPaused(move.old_name) || IsPaused(move.new_name);
+    const std::string old_queue = QueueOf(move.old_path);
+    (void)KOVA::KOVANOTIFYD::MonitorQueue::Delete(old_queue, "fileindex",
+                                                  KOVA::KOVANOTIFYD::MONITOR_QUEUE_TYPE_APPLICATION);
+    move_index(move);
+    if (!paused) GoOn(move.new_name);
+    (void)Unlink(old_queue);
+    (void)Unlink(old_queue + ".tmp");
+  } catch (const Error& error) {
+    throw Failure(Explain(error, "the share is at " + move.new_path + " now, but its index does not follow yet: run '" +
+                                     again + "' to finish"));
+  }
+}
+
+/// Whether anything still bears the share's old name or lies at its old place.
+bool HasRemains(const std::string& name, const std::string& old_path) {
+  const std::string queue = QueueOf(old_path);
+  return fileindex::FolderMgr().IsShareIndexed(name) || HasIndex(name) || Exists(queue) || Exists(queue + ".tmp");
+}
+
+/// Has the share renamed where it is kept, unless that was done before.
+Move RenameShare(const std::string& from, const std::string& to) {
+  const std::vector<ShareEntry> own = OwnEntry(from);
+  if (own.empty()) {
+    if (IsShare(from)) {
+      throw Failure("share " + from +
+                    " is kept by the file-sharing service; rename it there, then run this command again");
+    }
+    const std::string path = IsShare(to) ? sdk::SDKShare(to).GetPath() : "";
+    const Move move = {from, to, Dirname(path) + "/" + from, path};
+    if (path.empty() || !HasRemains(from, move.old_path)) {
+      throw Failure("there is no share \"" + from + "\"; 'fileindexctl share list' shows them");
+    }
+    return move;
+  }
+  const Move move = {from, to, own[0].path, Dirname(own[0].path) + "/" + to};
+  if (IsShare(to)) throw Failure("there is a share \"" + to + "\" already; choose another name");
+  RefuseSharesBelow(own[0]);
+  // Else the worker would take the folder for deleted.
+  (void)AskIndexDaemonIfRunning("worker_delete", ShareName(from));
+  RenameInTable(move);
+  return move;
+}
+
+}  // namespace
+
+int RunShareRename(const Arguments& arguments) {
+  const std::string& from = arguments.words[0];
+  const std::string& to = arguments.words[1];
+  if (from == to) throw UsageError("the new name is the old one");
+  if (to.empty() || to.find('/') != std::string::npos || to == "." || to == "..") {
+    throw UsageError("\"" + to + "\" cannot be a share's name: give the last part of the path");
+  }
+  RequireEngine();
+  const Move move = RenameShare(from, to);
+  const bool indexed = HasRemains(from, move.old_path) || fileindex::FolderMgr().IsShareIndexed(to);
+  if (indexed) Follow(move, &RenameIndex, "fileindexctl share rename " + from + " " + to);
+  (void)printf("share %s is now %s: %s%s\n", EscapeForTerminal(from).c_str(), EscapeForTerminal(to).c_str(),
+               EscapeForTerminal(move.new_path).c_str(), indexed ? "; its index follows" : "");
+  return kDone;
+}
+
+int RunShareMigrate(const Arguments& arguments) {
+  const std::string& name = arguments.words[0];
+  const std::string here = sdk::SDKShare(name).GetPath();
+  const std::string new_path = AbsolutePath(arguments.words[1]);
+  const Move move = {name, name, arguments.Has("--from") ? AbsolutePath(arguments.Get("--from")) : here, new_path};
+  const std::string again = "fileindexctl share migrate " + name + " " + new_path + " --from " + move.old_path;
+  if (move.old_path == new_path) {
+    throw Failure("share " + name + " is at " + new_path +
+                  " already; --from with its old folder finishes a migration that was interrupted");
+  }
+  RequireEngine();
+  if (here != new_path) {
+    const std::vector<ShareEntry> own = OwnEntry(name);
+    if (!own.empty()) RefuseSharesBelow(own[0]);
+    (void)AskIndexDaemonIfRunning("worker_delete", ShareName(name));
+    kova::host::MoveShare(name, new_path);
+  }
+  Follow(
+      move, [](const Move& moved) { fileindex::ShareMigrate(moved.new_name, moved.old_path, moved.new_path); }, again);
+  (void)printf("share %s is at %s; its index follows\n", EscapeForTerminal(name).c_str(),
+               EscapeForTerminal(new_path).c_str());
+  return kDone;
+}
+
+}  // namespace ferrox::cli

@@ -1,0 +1,224 @@
+#include "cli/command_table.h"
+
+namespace ferrox::cli {
+
+namespace {
+
+const Option kJson = {"--json", nullptr, "one line of JSON for scripts"};
+const Option kAccounts = {"--accounts", "local|domain|ldap", "whose homes (default local)"};
+const Option kName = {"--name", "NAME", "what people call it (default: the last part of the path)"};
+
+CommandGroup Services() {
+  return {
+      "The service",
+      {
+          {"up", "", {}, "Starts the search engine and the index daemon, and waits until they answer.", &RunUp, true},
+          {"down", "", {}, "Stops both.", &RunDown},
+          {"status",
+           "",
+           {kJson},
+           "Shows what runs, and for each share what is indexed, queued and failed.",
+           &RunStatus},
+          {"pause",
+           "[HOURS]",
+           {},
+           "Pauses indexing, for some hours or until 'resume'. Searching goes on.",
+           &RunPause,
+           true},
+          {"resume", "", {}, "Ends a pause.", &RunResume, true},
+          {"prepare",
+           "",
+           {},
+           "Starts the services that indexing needs when folders are indexed, else stops them.",
+           &RunPrepare,
+           true},
+      }};
+}
+
+CommandGroup Searching() {
+  return {"Searching",
+          {
+              {"search",
+               "QUERY...",
+               {{"--share", "SHARE", "search in this share only"},
+                {"--limit", "N", "show at most so many hits (default 10, at most 1000)"},
+                {"--offset", "N", "leave out the first N hits"},
+                {"--sort", "relevance|date|name|size", "the order (default: relevance)"},
+                kJson},
+               "Finds files. All words must match; \"a phrase\", prefix*, OR, NOT, ( ), kind:, ext:, path:, size: and "
+               "date: work.",
+               &RunSearch},
+              {"suggest-refresh",
+               "[SHARE...]",
+               {},
+               "Rebuilds what is suggested while a query is typed, for these shares or for all.",
+               &RunSuggestRefresh},
+          }};
+}
+
+CommandGroup Folders() {
+  const Option kinds = {"--kinds", "KINDS", "document, audio, video, photo, joined with commas; or all, or none"};
+  return {"What is indexed",
+          {
+              {"folder add",
+               "PATH...",
+               {kinds, kName},
+               "Has folders indexed: all kinds of files, unless told otherwise. All of the folders, or none.",
+               &RunFolderAdd,
+               true},
+              {"folder set",
+               "PATH...",
+               {kinds, kName},
+               "Changes of which kinds of files the content is indexed (--kinds is needed); adds what is missing.",
+               &RunFolderSet,
+               true},
+              {"folder delete",
+               "PATH...",
+               {},
+               "Ends the indexing of folders; the files stay. With the last folder of all, indexing stops.",
+               &RunFolderDelete,
+               true},
+              {"folder reindex",
+               "PATH...",
+               {},
+               "Has folders compared with the index; what differs is indexed.",
+               &RunFolderReindex,
+               true},
+              {"folder get", "PATH", {kJson}, "Shows one indexed folder.", &RunFolderGet},
+              {"folder list",
+               "",
+               {{"--status", nullptr, "also what each does now"},
+                {"--sort", "path|document|audio|video|photo", "the order (default: as they were added)"},
+                {"--desc", nullptr, "the other way round"},
+                {"--offset", "N", "leave out the first N"},
+                {"--limit", "N", "show at most so many"},
+                kJson},
+               "Lists the indexed folders.",
+               &RunFolderList},
+              {"index",
+               "SHARE",
+               {{"--wait", nullptr, "wait until it is done, and show progress"}},
+               "Has a share compared with its index; what differs is indexed.",
+               &RunIndex,
+               true},
+          }};
+}
+
+CommandGroup Shares() {
+  return {"Shares",
+          {
+              {"share add",
+               "FOLDER",
+               {{"--name", "NAME", "the share's name (default: the folder's last component, which it must equal)"},
+                {"--replace", nullptr, "an earlier share of that name, with another folder, makes way"},
+                {"--no-index", nullptr, "do not index it; 'folder add' chooses what is"}},
+               "Makes a folder a share and has all of it indexed.",
+               &RunShareAdd,
+               true},
+              {"share list", "", {kJson}, "Lists the shares: name and folder.", &RunShareList},
+              {"share remove",
+               "SHARE",
+               {},
+               "Ends a share and drops its index; the folder and its files stay.",
+               &RunShareRemove,
+               true},
+              {"share rename",
+               "SHARE NEW_NAME",
+               {},
+               "Renames a share and its folder; its index follows.",
+               &RunShareRename,
+               true},
+              {"share migrate",
+               "SHARE NEW_FOLDER",
+               {{"--from", "FOLDER", "where it was, to finish a migration that was interrupted"}},
+               "Tells that a share's folder has been moved, for example to another volume; its index follows.",
+               &RunShareMigrate,
+               true},
+              {"share pause", "SHARE", {}, "Stops the indexing of a share.", &RunSharePause, true},
+              {"share resume",
+               "SHARE",
+               {},
+               "Goes on with a share; what has changed meanwhile is indexed.",
+               &RunShareResume,
+               true},
+              {"share forget",
+               "SHARE [FOLDER]",
+               {},
+               "Drops the index of a paused share that does not come back; its folder is needed when it is gone.",
+               &RunShareForget,
+               true},
+              {"share check-recycle",
+               "SHARE",
+               {},
+               "Looks at a share's recycle bin again, after it was switched on or off.",
+               &RunShareCheckRecycle,
+               true},
+          }};
+}
+
+CommandGroup HostEvents() {
+  return {"Volumes, homes, users",
+          {
+              {"volume pause",
+               "MOUNT_POINT",
+               {},
+               "Stops the indexing of all folders on a volume that goes away.",
+               &RunVolumePause,
+               true},
+              {"volume resume", "MOUNT_POINT", {}, "Goes on with them.", &RunVolumeResume, true},
+              {"volume forget",
+               "MOUNT_POINT",
+               {},
+               "Drops the paused folders of a volume that does not come back.",
+               &RunVolumeForget,
+               true},
+              {"home enable",
+               "",
+               {kAccounts},
+               "Tells that the users' home folders were switched on.",
+               &RunHomeEnable,
+               true},
+              {"home disable",
+               "",
+               {kAccounts},
+               "Tells that the users' home folders were switched off.",
+               &RunHomeDisable,
+               true},
+              {"user rename",
+               "OLD NEW",
+               {},
+               "Tells that a user, and the folder in the share \"homes\", has another name.",
+               &RunUserRename,
+               true},
+          }};
+}
+
+CommandGroup Inspection() {
+  return {"Looking inside",
+          {{"queue show",
+            "FILE",
+            {{"--json", nullptr, "one JSON object a line"}},
+            "Prints the operations that a queue file asks for, one a line; changes nothing.",
+            &RunQueueShow}}};
+}
+
+}  // namespace
+
+const std::vector<CommandGroup>& CommandTable() {
+  static const std::vector<CommandGroup> table = {Services(), Searching(),  Folders(),
+                                                  Shares(),   HostEvents(), Inspection()};
+  return table;
+}
+
+const Command* FindCommand(const std::vector<std::string>& words, size_t& count) {
+  for (const CommandGroup& group : CommandTable()) {
+    for (const Command& command : group.commands) {
+      const std::string name = command.name;
+      count = name.find(' ') == std::string::npos ? 1 : 2;
+      if (words.size() >= count && name == (count == 1 ? words[0] : words[0] + " " + words[1])) return &command;
+    }
+  }
+  return nullptr;
+}
+
+}  // namespace ferrox::cli

@@ -1,0 +1,151 @@
+#include "cli/completion.h"
+
+#include <dirent.h>
+
+#include <algorithm>
+#include <cstdio>
+#include <memory>
+
+#include "cli/command_table.h"
+#include "cli/folder_path.h"
+#include "cli/global_options.h"
+#include "cli/kinds.h"
+#include "common/file_util.h"
+#include "fileindex/folder_mgr.h"
+#include "sdk/share.h"
+
+namespace ferrox::cli {
+
+namespace {
+
+using Words = std::vector<std::string>;
+
+/// The folders of an indexed share below what has been typed so far: "/photo/tr" gives "/photo/trips".
+Words FoldersBelow(const std::string& typed) {
+  Words found;
+  const std::string parent = typed.substr(0, typed.rfind('/'));
+  for (const std::string& share : sdk::SDKShare::Enum()) {
+    if (!StringStartWith(parent + "/", "/" + share + "/")) continue;
+    const std::string folder = sdk::SDKShare(share).GetPath() + parent.substr(1 + share.size());
+    const std::unique_ptr<DIR, int (*)(DIR*)> entries(opendir(folder.c_str()), &closedir);
+    if (entries == nullptr) continue;
+    while (const dirent* entry = readdir(entries.get())) {
+      const std::string name = entry->d_name;
+      if (name[0] != '.' && IsDirentDir(*entry, folder + "/" + name)) found.push_back(parent + "/" + name);
+    }
+  }
+  return found;
+}
+
+Words SharePaths(const std::string& typed) {
+  Words found = {":open"};
+  if (typed.empty() || typed[0] != '/') found.push_back(":folders");
+  const fileindex::FolderMgr configured;
+  for (const auto& folder : configured.GetFolders()) found.push_back(folder->GetPath());
+  for (const std::string& share : sdk::SDKShare::Enum()) found.push_back("/" + share);
+  for (const std::string& folder : FoldersBelow(typed)) found.push_back(folder);
+  return found;
+}
+
+/// "document,au" gives "document,audio".
+Words KindLists(const std::string& typed) {
+  const size_t comma = typed.rfind(',');
+  const std::string before = comma == std::string::npos ? "" : typed.substr(0, comma + 1);
+  Words found = {":open"};
+  for (const char* kind : kKinds) found.push_back(before + kind);
+  if (before.empty()) found.insert(found.end(), {"all", "none"});
+  return found;
+}
+
+/// What can stand for a name of the usage line.
+Words Candidates(std::string name, const std::string& typed) {
+  if (name.find('|') != std::string::npos) return Split(name, '|');
+  while (!name.empty() && (name.back() == ']' || name.back() == '.')) name.pop_back();
+  if (!name.empty() && name[0] == '[') name.erase(0, 1);
+  if (name == "SHARE") return sdk::SDKShare::Enum();
+  if (name == "PATH") return SharePaths(typed);
+  if (name == "KINDS") return KindLists(typed);
+  if (name == "FILE") return {":files"};
+  if (name == "FOLDER" || name == "NEW_FOLDER" || name == "MOUNT_POINT") return {":folders"};
+  return {};
+}
+
+/// The first words of all commands, or the second ones of those that begin with `first`.
+Words CommandWords(const std::string& first) {
+  Words found;
+  for (const CommandGroup& group : CommandTable()) {
+    for (const Command& command : group.commands) {
+      const Words name = Split(command.name, ' ');
+      const std::string& word = first.empty() ? name[0] : name.back();
+      if (!first.empty() && (name.size() < 2 || name[0] != first)) continue;
+      if (found.empty() || found.back() != word) found.push_back(word);
+    }
+  }
+  return found;
+}
+
+/// Of a command, the last of the words given behind its name.
+Words ArgumentWords(const Command& command, const Words& given) {
+  const std::string& typed = given.back();
+  size_t place = 0;
+  const Option* pending = nullptr;
+  for (size_t i = 0; i + 1 < given.size(); ++i) {
+    const Option* known = pending;
+    pending = nullptr;
+    if (known != nullptr) continue;  // this word is an option's value
+    if (given[i].compare(0, 2, "--") != 0) ++place;
+    for (const Option& option : command.options) {
+      if (given[i] == option.name && option.value != nullptr) pending = &option;
+    }
+  }
+  if (pending != nullptr) return Candidates(pending->value, typed);
+  if (typed.compare(0, 1, "-") == 0) {
+    Words found = {"--help"};
+    for (const Option& option : command.options) found.emplace_back(option.name);
+    return found;
+  }
+  const Words names = Split(command.words, ' ');
+  if (place >= names.size()) {
+    const bool repeated = names.back().find("...") != std::string::npos;
+    return repeated ? Candidates(names.back(), typed) : Words();
+  }
+  return Candidates(names[place], typed);
+}
+
+Words AllCompletions(Words& words) {
+  TakeRoot(words);
+  if (words.empty()) return {};
+  if (words.size() == 1) {
+    Words found = CommandWords("");
+    found.insert(found.end(), {"--root", "--help", "--version"});
+    return found;
+  }
+  if (words[words.size() - 2] == "--root") return {":folders"};
+  size_t count = 0;
+  const Words typed_before(words.begin(), words.end() - 1);
+  const Command* command = FindCommand(typed_before, count);
+  if (command == nullptr) return words.size() == 2 ? CommandWords(words[0]) : Words();
+  return ArgumentWords(*command, {words.begin() + static_cast<std::ptrdiff_t>(count), words.end()});
+}
+
+}  // namespace
+
+std::vector<std::string> Completions(std::vector<std::string> words) {
+  const std::string typed = words.empty() ? "" : words.back();
+  Words found;
+  for (const std::string& candidate : AllCompletions(words)) {
+    const bool for_shell = candidate.compare(0, 1, ":") == 0;
+    if (candidate.find('\n') != std::string::npos) continue;  // such a name cannot be told on a line
+    if (for_shell || StringStartWith(candidate, typed)) found.push_back(candidate);
+  }
+  std::sort(found.begin(), found.end());
+  found.erase(std::unique(found.begin(), found.end()), found.end());
+  return found;
+}
+
+int PrintCompletions(const std::vector<std::string>& words) {
+  for (const std::string& candidate : Completions(words)) (void)printf("%s\n", candidate.c_str());
+  return kDone;
+}
+
+}  // namespace ferrox::cli

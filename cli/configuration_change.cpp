@@ -1,0 +1,59 @@
+#include "cli/configuration_change.h"
+
+#include <cstring>
+
+#include "cli/command.h"
+#include "cli/explain.h"
+#include "common/file_util.h"
+#include "common/log.h"
+#include "common/paths.h"
+#include "common/scope_exit.h"
+#include "fileindex/folder_mgr.h"
+
+namespace ferrox::cli {
+
+namespace {
+
+constexpr char kNotDone[] = "Not done: ";
+
+std::string g_not_done;
+LogSink g_log = nullptr;
+
+/// The log's line about the steps that a failed operation has not got to; it goes on into the log, like all.
+void NoteNotDone(int priority, const char* line) {
+  const char* found = strstr(line, kNotDone);
+  if (found != nullptr) g_not_done = found + sizeof(kNotDone) - 1;
+  g_log(priority, line);
+}
+
+std::string FoldersFile() {
+  std::string content;
+  (void)ReadWholeFile(InstancePath(kFileIndexFoldersCfgPath), content);
+  return content;
+}
+
+}  // namespace
+
+void ChangeConfiguration(const std::function<void()>& change) {
+  const std::string before = FoldersFile();
+  g_log = SetLogSink(&NoteNotDone);
+  const ScopeExit restore([] { (void)SetLogSink(g_log); });
+  try {
+    change();
+  } catch (const Error& error) {
+    std::string note = g_not_done.empty() ? "" : "not done: " + g_not_done + "; ";
+    note += FoldersFile() == before
+                ? "the list of indexed folders is as it was"
+                : "the list of indexed folders is changed, but the index may not follow: run 'fileindexctl up', then "
+                  "'fileindexctl index' with the share's name";
+    throw Failure(Explain(error, note));
+  }
+}
+
+void RequireIndexed(const std::string& share, const fileindex::FolderMgr& configured) {
+  if (configured.IsShareIndexed(share)) return;
+  throw Failure("no folder of share \"" + share + "\" is indexed; 'fileindexctl folder add /" + share +
+                "' adds all of it");
+}
+
+}  // namespace ferrox::cli

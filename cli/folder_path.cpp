@@ -1,0 +1,100 @@
+#include "cli/folder_path.h"
+
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <vector>
+
+#include "cli/command.h"
+#include "common/error.h"
+#include "common/file_util.h"
+#include "fileindex/folder_mgr.h"
+#include "fileindex/util.h"
+#include "sdk/share.h"
+
+namespace ferrox::cli {
+
+namespace {
+
+bool Exists(const std::string& path) {
+  struct stat status = {};
+  return lstat(path.c_str(), &status) == 0;
+}
+
+std::string FromWorkingFolder(const std::string& text) {
+  if (text[0] == '/') return text;
+  char folder[4096];
+  if (getcwd(folder, sizeof(folder)) == nullptr) {
+    throw Failure("the working folder cannot be told; give a path that begins with /");
+  }
+  return std::string(folder) + "/" + text;
+}
+
+/// The share path of a path on disk, "" when no share holds it. Asking the library would log a failure.
+std::string SharePathOnDisk(const std::string& path) {
+  std::string best;
+  std::string best_folder;
+  for (const std::string& name : sdk::SDKShare::Enum()) {
+    const std::string folder = sdk::SDKShare(name).GetPath();
+    if (!StringStartWith(path + "/", folder + "/") || folder.size() < best_folder.size()) continue;
+    best_folder = folder;
+    best = "/" + name + path.substr(folder.size());
+  }
+  return best;
+}
+
+/// The full path of a share path; "" when there is no such share.
+std::string FullPathInShare(const std::string& share_path) {
+  const std::vector<std::string> shares = sdk::SDKShare::Enum();
+  const std::string name = share_path.substr(1, share_path.find('/', 1) - 1);
+  if (std::find(shares.begin(), shares.end(), name) == shares.end()) return {};
+  return sdk::SDKShare(name).GetPath() + share_path.substr(1 + name.size());
+}
+
+std::string OnDisk(const std::string& text) {
+  const std::string path = AbsolutePath(text);
+  const std::string share_path = SharePathOnDisk(path);
+  if (!share_path.empty()) return share_path;
+  const std::string real = RealPath(path);
+  if (!real.empty() && real != path && !SharePathOnDisk(real).empty()) {
+    throw Failure(text + " is, without links, " + real + "; add that folder");
+  }
+  throw Failure(text +
+                (real.empty() ? " is neither a folder in a share nor one on disk"
+                              : " lies in no share; 'fileindexctl share add' makes it one") +
+                ("; 'fileindexctl share list' shows the shares"));
+}
+
+}  // namespace
+
+std::string CleanPath(const std::string& absolute, bool parents) {
+  std::vector<std::string> kept;
+  for (const std::string& part : Split(absolute, '/')) {
+    if (part.empty() || part == ".") continue;
+    if (!parents || part != "..") {
+      kept.push_back(part);
+    } else if (!kept.empty()) {
+      kept.pop_back();
+    }
+  }
+  std::string path;
+  for (const std::string& part : kept) path += "/" + part;
+  return path.empty() ? "/" : path;
+}
+
+std::string AbsolutePath(const std::string& text) { return CleanPath(FromWorkingFolder(text), true); }
+
+std::string ToSharePath(const std::string& text, const fileindex::FolderMgr& configured) {
+  if (text.empty()) throw UsageError("an empty path is no folder");
+  if (configured.HasFolder(text)) return text;
+  if (text[0] != '/') return OnDisk(text);
+  const std::string cleaned = CleanPath(text, false);
+  if (configured.HasFolder(cleaned)) return cleaned;
+  const std::string in_share = FullPathInShare(cleaned);
+  if (in_share.empty()) return OnDisk(text);
+  const std::string as_disk_path = SharePathOnDisk(cleaned);
+  return !as_disk_path.empty() && !Exists(in_share) && Exists(cleaned) ? as_disk_path : cleaned;
+}
+
+}  // namespace ferrox::cli

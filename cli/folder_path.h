@@ -1,0 +1,22 @@
+#pragma once
+
+#include <string>
+
+namespace ferrox::fileindex {
+class FolderMgr;
+}
+
+namespace ferrox::cli {
+
+/// The share path ("/photo/trip") of the folder that a person means by `text`: a share path, or a path on disk, also
+/// one from the working folder. Needless "/" and "." are dropped. A path of `configured` stands for itself, whatever
+/// has become of its folder. Where a text can be read both ways, the way that exists counts, the share path first.
+/// @throws Failure for a path on disk that no share holds.
+std::string ToSharePath(const std::string& text, const fileindex::FolderMgr& configured);
+
+/// An absolute path without needless "/" and ".", and without ".." when `parents` is set; nothing is looked up.
+std::string CleanPath(const std::string& absolute, bool parents);
+/// The same for a path that may begin in the working folder, ".." resolved.
+std::string AbsolutePath(const std::string& text);
+
+}  // namespace ferrox::cli

@@ -1,0 +1,36 @@
+#include "cli/global_options.h"
+
+#include <unistd.h>
+
+#include <cstdlib>
+
+#include "cli/command.h"
+
+namespace ferrox::cli {
+
+namespace {
+
+void UseRoot(const std::string& root) {
+  std::string absolute = root;
+  if (root.empty()) throw UsageError("--root needs a folder");
+  if (root[0] != '/') {
+    char folder[4096];
+    if (getcwd(folder, sizeof(folder)) == nullptr)
+      throw Failure("the working folder cannot be told; give --root a path that begins with /");
+    absolute = std::string(folder) + "/" + root;
+  }
+  (void)setenv("FERROX_ROOT", absolute.c_str(), 1);
+}
+
+}  // namespace
+
+void TakeRoot(std::vector<std::string>& words) {
+  while (!words.empty() && (words[0] == "--root" || words[0].compare(0, 7, "--root=") == 0)) {
+    const bool joined = words[0] != "--root";
+    if (!joined && words.size() == 1) throw UsageError("--root needs a folder");
+    UseRoot(joined ? words[0].substr(7) : words[1]);
+    words.erase(words.begin(), words.begin() + (joined ? 1 : 2));
+  }
+}
+
+}  // namespace ferrox::cli

@@ -1,0 +1,30 @@
+#pragma once
+
+#include <array>
+#include <string>
+
+#include <json/value.h>
+
+namespace ferrox::cli {
+
+/// The kinds of files whose content can be indexed, in the order of the configuration.
+inline constexpr std::array<const char*, 4> kKinds = {"document", "audio", "video", "photo"};
+
+/// A choice of kinds.
+class Kinds {
+ public:
+  /// From "document,photo", "all" or "none". @throws UsageError.
+  explicit Kinds(const std::string& text);
+  /// From the stored form of a folder.
+  explicit Kinds(const Json::Value& folder);
+
+  /// Sets the members of the stored form of a folder.
+  void Store(Json::Value& folder) const;
+  /// For people: "document, photo", "all kinds", "names only".
+  std::string Text() const;
+
+ private:
+  std::array<bool, kKinds.size()> chosen_ = {};
+};
+
+}  // namespace ferrox::cli

@@ -1,0 +1,141 @@
+"""The tool on an instance without daemons: usage, paths, completion."""
+
+import json
+import os
+import re
+import shutil
+import subprocess
+import tempfile
+import unittest
+
+BIN = os.environ.get("FERROX_BIN", "")
+SOURCE = os.path.join(os.path.dirname(os.path.abspath(__file__)), "..", "..")
+TOOL = os.path.join(BIN, "fileindexctl")
+
+
+def write_json(path, value):
+    os.makedirs(os.path.dirname(path), exist_ok=True)
+    with open(path, "w", encoding="utf-8") as file:
+        json.dump(value, file)
+
+
+class ToolTest(unittest.TestCase):
+    def setUp(self):
+        self.root = os.path.realpath(tempfile.mkdtemp(prefix="fi-"))
+        self.addCleanup(shutil.rmtree, self.root)
+        self.env = dict(os.environ, FERROX_ROOT=self.root, LC_ALL="C.UTF-8")
+        for folder in ("photo/trip", "photo/tree/deep", "photos/a b"):
+            os.makedirs(f"{self.root}/vol/{folder}")
+        write_json(f"{self.root}/etc/kova/shares.json",
+                   [{"name": name, "path": f"{self.root}/vol/{name}"} for name in ("photo", "photos")])
+        kinds = {"document": True, "audio": False, "video": False, "photo": True}
+        write_json(f"{self.root}/var/packages/Ferrox/etc/fileindex.folders",
+                   [{"path": path, "name": "n", **kinds} for path in ("/photo/trip", "/photos/a b", "/gone/x")])
+
+    def run_tool(self, *words, cwd="/"):
+        return subprocess.run([TOOL, *words], env=self.env, cwd=cwd, capture_output=True, timeout=60, check=False)
+
+    def complete(self, *words):
+        return self.run_tool("complete-words", *words).stdout.decode().splitlines()
+
+    def commands(self):
+        for first in self.complete(""):
+            if not first.startswith("-"):
+                seconds = self.complete(first, "") if self.run_tool(first, "--help").returncode else []
+                yield from [[first, second] for second in seconds] or [[first]]
+
+    def test_folder_is_named_as_people_would(self):
+        os.symlink(f"{self.root}/vol/photo", f"{self.root}/link")
+        os.symlink("/etc", f"{self.root}/etc-link")
+        os.makedirs(f"{self.root}/vol/photo/photos/a b")  # looks like a share path from inside of share photo
+        vol, trip, blank = f"{self.root}/vol", "/photo/trip", "/photos/a b"
+        rows = [
+            ("/photo/trip", "/", trip), ("/photo/trip/", "/", trip), ("//photo/.//trip", "/", trip),
+            (f"{vol}/photo/trip", "/", trip), (f"{vol}/photos/../photo/trip/.", "/", trip),
+            ("trip", f"{vol}/photo", trip), (".", f"{vol}/photo/trip", trip), ("../trip", f"{vol}/photo/tree", trip),
+            (blank, f"{vol}/photo", blank), ("./a b", f"{vol}/photos", blank), ("/gone/x", "/", "/gone/x"),
+            ("/photo/../photo/trip", "/", b"(error 902)"), ("/photo", "/", b"(error 902)"),
+            (f"{self.root}/link/trip", "/", b"is, without links"), (f"{self.root}/etc-link", "/", b"share add"),
+            ("/etc", "/", b"lies in no share"), ("/phot", "/", b"neither"), ("/photosx", "/", b"neither"),
+        ]
+        for word, cwd, expected in rows:
+            with self.subTest(word=word, cwd=cwd):
+                done = self.run_tool("folder", "get", "--json", word, cwd=cwd)
+                if isinstance(expected, bytes):
+                    self.assertEqual(3, done.returncode)
+                    self.assertIn(expected, done.stderr)
+                else:
+                    self.assertEqual(0, done.returncode, done.stderr)
+                    self.assertEqual(expected, json.loads(done.stdout)["path"])
+
+    def test_list_shows_pages_and_order(self):
+        listed = json.loads(self.run_tool("folder", "list", "--json", "--sort", "path", "--desc", "--offset", "1",
+                                          "--limit", "1").stdout)
+        self.assertEqual((["/photo/trip"], 3), ([folder["path"] for folder in listed["folder"]], listed["total"]))
+        shown = self.run_tool("folder", "list").stdout.decode()
+        self.assertIn("/photos/a b\n    document, photo, \"n\"\n", shown)
+        self.assertEqual(3, len(re.findall("document, photo", shown)))
+
+    def test_usage_is_checked_before_anything_is_done(self):
+        rows = [("--kinds takes", ["folder", "add", "--kinds", "music", "/photo"]),
+                ("--kinds is needed", ["folder", "set", "/photo"]), ("--name goes with one", ["folder", "add", "/photo",
+                                                                                           "/photos", "--name", "x"]),
+                ("--sort takes one of", ["folder", "list", "--sort", "size"]), ("missing", ["share", "rename", "a"]),
+                ("too many", ["share", "rename", "a", "b", "c"]), ("--accounts takes", ["home", "enable", "--accounts", "x"]),
+                ("cannot be a share's name", ["share", "rename", "photo", "a/b"]), ("no command", ["folder", "nonsense"])]
+        for text, words in rows:
+            with self.subTest(words=words):
+                done = self.run_tool(*words)
+                self.assertEqual(2, done.returncode, done.stderr)
+                self.assertIn(text, done.stderr.decode())
+
+    def test_every_command_has_help_and_stands_in_the_manual(self):
+        with open(f"{SOURCE}/docs/man/fileindexctl.1", encoding="utf-8") as file:
+            manual = re.sub(r"\\f.|^\.\w+ |\"", "", file.read().replace("\\-", "-"), flags=re.M)
+        commands = list(self.commands())
+        self.assertGreater(len(commands), 25)
+        for command in commands:
+            with self.subTest(command=command):
+                self.assertIn(b"Usage: fileindexctl " + " ".join(command).encode(), self.run_tool(*command, "--help").stdout)
+                place = re.search("^" + " ".join(command) + r"( |$)(.*)", manual, re.M)
+                self.assertTrue(place, "not in the manual")
+                for option in self.complete(*command, "--"):
+                    self.assertIn(option, place.group(2) + " --help", "not in the manual")
+
+    def test_completion_knows_commands_shares_folders_and_kinds(self):
+        rows = [
+            (["fol"], ["folder"]), (["--root", self.root, "share", "ren"], ["rename"]), (["folder", "r"], ["reindex"]),
+            (["index", "ph"], ["photo", "photos"]), (["search", "--share", "photos"], ["photos"]),
+            (["search", "--sort", "s"], ["size"]), (["folder", "list", "--st"], ["--status"]),
+            (["folder", "add", "x", "--kinds", "document,v"], [":open", "document,video"]),
+            (["folder", "delete", "/photos"], [":open", "/photos/a b", "/photos"]),
+            (["folder", "add", "/photo/tr"], [":open", "/photo/tree", "/photo/trip"]),
+            (["share", "add", ""], [":folders"]), (["queue", "show", ""], [":files"]), (["share", "forget", "photo", ""], [":folders"]),
+            (["index", "photo", ""], []), (["nonsense", ""], []),
+        ]
+        for words, expected in rows:
+            with self.subTest(words=words):
+                self.assertEqual(sorted(expected), self.complete(*words))
+
+    def test_bash_completes(self):
+        script = f"""
+            . {SOURCE}/packaging/completions/fileindexctl.bash
+            compopt() {{ :; }}
+            COMP_WORDS=({TOOL} "$@"); COMP_CWORD=$#
+            _fileindexctl; printf '%s\\n' "${{COMPREPLY[@]}}" """
+        rows = [(["folder", "a"], ["add"]), (["folder", "add", "x", "--kinds", "=", "au"], ["audio"]),
+                (["folder", "set", "/photos/a\\ "], ["/photos/a\\ b"]), (["search", "--sort", "="], ["date", "name", "relevance", "size"]),
+                (["share", "add", f"{self.root}/vo"], [f"{self.root}/vol"]), (["index", "ph"], ["photo", "photos"])]
+        for words, expected in rows:
+            with self.subTest(words=words):
+                done = subprocess.run(["bash", "-c", script, "bash", *words], env=self.env, capture_output=True, timeout=60,
+                                      check=True)
+                self.assertEqual(expected, done.stdout.decode().split("\n")[:-1], done.stderr)
+
+    @unittest.skipUnless(shutil.which("zsh"), "zsh is not installed")
+    def test_zsh_reads_the_completion(self):
+        subprocess.run(["zsh", "-n", f"{SOURCE}/packaging/completions/_fileindexctl"], check=True, timeout=60)
+
+
+if __name__ == "__main__":
+    unittest.main()

@@ -1,0 +1,304 @@
+"""Everything that is managed, on live daemons, with the documents of the index checked after each step; and what must not
+be done."""
+
+import json
+import os
+import signal
+import subprocess
+import time
+import unittest
+
+from instance import BIN, CREATE, Instance, event, on_disk, wait_for
+
+
+def write(path, text):
+    os.makedirs(os.path.dirname(path), exist_ok=True)
+    with open(path, "w", encoding="utf-8") as file:
+        file.write(text)
+
+
+class ManagementWalkTest(unittest.TestCase):
+    def setUp(self):
+        self.instance = Instance()
+        self.addCleanup(self.stop)
+        self.vol = f"{os.path.realpath(self.instance.root)}/vol"
+        self.ctl = self.instance.ctl
+
+    def stop(self):
+        left = self.instance.stop()
+        self.assertEqual([], left, "processes that 'down' left running")
+
+    def share_without_folders(self, name):
+        return self.instance.add_share(name, "--no-index")
+
+    def expect_documents(self, share, folder, *indexed):
+        """The index holds the indexed folders of the share at `folder`, all below them, and nothing else."""
+        self.instance.wait_idle(share, folder)
+        expected = [os.fsencode(path) for path in indexed if path != folder]
+        expected += [path for parent in indexed for path in on_disk(parent)]
+        query = {"qsl": {"prefix": {"KOVAMDPath": self.vol[:-len("vol")]}}, "load_field": ["KOVAMDPath"]}
+        reply = self.instance.ask("kovaelasticd", {"command": "document_get_by_query",
+                                                   "data": {"id": "fileindex_" + share, "query": query}})
+        documents = {entry["KOVAMDPath"].encode("utf-8", "surrogateescape") for entry in reply["data"]}
+        self.assertEqual(set(expected), documents - {os.fsencode(folder)})
+
+    def expect_found(self, word, *paths):
+        self.assertEqual({os.fsencode(path) for path in paths}, set(self.instance.search(word)), word)
+
+    def indices(self):
+        reply = self.instance.ask("kovaelasticd", {"command": "index_list", "data": {}})
+        return {index["id"]: index["paused"] for index in reply["data"]}
+
+    def files_below(self, folder):
+        return [os.path.join(parent, name) for parent, _, names in os.walk(f"{self.instance.root}/{folder}")
+                for name in names if not name.endswith(".lock")]
+
+    def test_walk(self):
+        self.ctl("up")
+        docs, media = self.share_without_folders("docs"), self.share_without_folders("media")
+        write(f"{docs}/letters/anna.txt", "zeppelin for anna")
+        write(f"{docs}/letters/berta.txt", "zeppelin for berta")
+        write(f"{docs}/letters/view.jpg", "no real picture")
+        write(f"{docs}/plans/roof.txt", "zeppelin over the roof")
+        write(f"{docs}/private/secret.txt", "zeppelin, secret")
+        write(f"{media}/films/list.txt", "all films with a zeppelin")
+        anna, berta, roof = f"{docs}/letters/anna.txt", f"{docs}/letters/berta.txt", f"{docs}/plans/roof.txt"
+        films = f"{media}/films/list.txt"
+
+        self.ctl("folder", "add", "/docs/letters", f"{docs}/plans/")
+        self.ctl("folder", "add", "/media/films")
+        self.expect_documents("docs", docs, f"{docs}/letters", f"{docs}/plans")
+        self.expect_documents("media", media, f"{media}/films")
+        self.expect_found("zeppelin", anna, berta, roof, films)
+        self.expect_found("secret")
+
+        self.switch_a_kind(docs, roof, films, anna, berta)
+        papers = self.rename_and_move(docs)
+        self.pause_and_resume(papers, films)
+        self.rename_a_user()
+        self.delete_all(papers)
+
+    def switch_a_kind(self, docs, roof, films, anna, berta):
+        def written():
+            return self.instance.share_status("docs")["written"]
+        before = written()
+        self.ctl("folder", "set", "/docs/letters", "--kinds", "audio,video,photo")
+        self.expect_documents("docs", docs, f"{docs}/letters", f"{docs}/plans")
+        self.expect_found("zeppelin", roof, films)
+        self.expect_found("name:berta.txt", berta)
+        self.assertEqual(2, written() - before, "the two documents were done again, nothing else")
+        self.ctl("folder", "set", "/docs/letters", "--kinds", "document,audio,video")
+        self.instance.wait_idle("docs", docs)
+        self.expect_found("zeppelin", anna, berta, roof, films)
+        self.assertEqual(5, written() - before, "two documents and a picture")
+        self.ctl("folder", "set", "/docs/letters", "--kinds", "all")
+        self.instance.wait_idle("docs", docs)
+        self.assertEqual(6, written() - before, "the picture")
+        self.ctl("folder", "set", "/docs/letters", "--kinds", "all")
+        self.instance.wait_idle("docs", docs)
+        self.assertEqual(6, written() - before, "no kind was changed")
+
+    def rename_and_move(self, docs):
+        old_queue = self.instance.queue_path(docs)
+        self.ctl("share", "rename", "docs", "papers")
+        papers = f"{self.vol}/papers"
+        self.assertFalse(os.path.exists(docs) or os.path.exists(old_queue))
+        self.assertEqual(["/media/films", "/papers/letters", "/papers/plans"],
+                         sorted(folder["path"] for folder in self.instance.folders()))
+        self.expect_documents("papers", papers, f"{papers}/letters", f"{papers}/plans")
+        self.assertIn(os.fsencode(f"{papers}/letters/anna.txt"), self.instance.search("anna"))
+        self.assertEqual({"fileindex_papers", "fileindex_media"}, set(self.indices()))
+
+        moved = f"{self.vol}2/papers"
+        os.makedirs(f"{self.vol}2")
+        os.rename(papers, moved)
+        self.ctl("share", "migrate", "papers", moved)
+        self.expect_documents("papers", moved, f"{moved}/letters", f"{moved}/plans")
+        self.expect_found("berta", f"{moved}/letters/berta.txt")
+        self.assertFalse(os.path.exists(self.instance.queue_path(papers)))
+        return moved
+
+    def pause_and_resume(self, papers, films):
+        for stop, go, word in ((("share", "pause", "papers"), ("share", "resume", "papers"), "otter"),
+                               (("volume", "pause", f"{self.vol}2"), ("volume", "resume", f"{self.vol}2/"), "badger")):
+            self.ctl(*stop)
+            self.assertEqual({"fileindex_papers": True, "fileindex_media": False}, self.indices())
+            self.assertEqual({"/papers/letters": True, "/papers/plans": True, "/media/films": False},
+                             {folder["path"]: folder["paused"] for folder in self.instance.folders()})
+            self.assertEqual([{"folders": 2, "paused": True, "share": "papers"}], self.instance.status()["resting_shares"])
+            new = f"{papers}/letters/{word}.txt"
+            write(new, word)
+            self.instance.queue(papers, event(CREATE, new))
+            write(f"{self.vol}/media/films/{word}.txt", word)
+            self.instance.queue(f"{self.vol}/media", event(CREATE, f"{self.vol}/media/films/{word}.txt"))
+            self.instance.wait_idle("media", f"{self.vol}/media")
+            self.expect_found(word, f"{self.vol}/media/films/{word}.txt")
+            self.expect_found("roof")
+            self.ctl(*go)
+            self.expect_documents("papers", papers, f"{papers}/letters", f"{papers}/plans")
+            self.expect_found(word, new, f"{self.vol}/media/films/{word}.txt")
+            self.expect_found("list", films)
+        self.ctl("folder", "set", "/papers/plans", "--kinds", "all")  # forgets the volume that it was paused with
+
+    def rename_a_user(self):
+        homes = self.share_without_folders("homes")
+        for user in ("anna", "annabel"):
+            write(f"{homes}/{user}/notes/diary.txt", f"capybara of {user}")
+        self.ctl("folder", "add", "/homes/anna", "/homes/annabel/notes", "/homes/anna/notes")
+        self.expect_documents("homes", homes, f"{homes}/anna", f"{homes}/annabel/notes")
+        os.rename(f"{homes}/anna", f"{homes}/carla")
+        self.ctl("user", "rename", "anna", "carla")
+        self.expect_documents("homes", homes, f"{homes}/carla", f"{homes}/annabel/notes")
+        self.expect_found("capybara", f"{homes}/carla/notes/diary.txt", f"{homes}/annabel/notes/diary.txt")
+
+    def delete_all(self, papers):
+        self.ctl("folder", "delete", "/papers/letters")
+        self.expect_documents("papers", papers, f"{papers}/plans")
+        pid = self.instance.pid("fileindexd")
+        self.ctl("folder", "delete", *(folder["path"] for folder in self.instance.folders()))
+        self.assertEqual([], self.instance.folders())
+        wait_for(lambda: not os.path.exists(f"/proc/{pid}/exe"), "the index daemon to stop")
+        self.assertIsNone(self.instance.status()["index_daemon"])
+        self.assertEqual({}, self.indices())
+        self.assertEqual([], self.files_below("var/lib/kova/fileindex"))
+        self.assertEqual([], self.files_below("var/lib/kova/notifyd"))
+        with open(f"{self.instance.root}/var/packages/Ferrox/etc/fileindex.status", encoding="utf-8") as file:
+            self.assertFalse(json.load(file).get("share"))
+        self.assertEqual([], self.instance.search("zeppelin"))
+        self.ctl("folder", "add", "/papers/plans")
+        self.expect_documents("papers", papers, f"{papers}/plans")
+
+    # What must not be done, and what goes wrong.
+
+    def expect_refused(self, code, *words, text=""):
+        before = self.instance.folders()
+        done = self.instance.run(*words)
+        self.assertEqual(3, done.returncode, done.stderr)
+        self.assertIn(f"(error {code})" if code else text, done.stderr.decode())
+        self.assertIn(text, done.stderr.decode())
+        self.assertEqual(before, self.instance.folders())
+
+    def test_bad_input_changes_nothing(self):
+        self.ctl("up")
+        photo = self.share_without_folders("photo")
+        photos = self.share_without_folders("photos")
+        gone = self.share_without_folders("gone")
+        for folder in (f"{photo}/trip", f"{photo}/other", f"{photos}/trip"):
+            os.makedirs(folder)
+        os.symlink("trip", f"{photo}/link")
+        write(f"{photo}/file.txt", "")
+        os.rmdir(gone)
+        self.ctl("folder", "add", "/photo/trip")
+        rows = [
+            (901, "folder set", ["folder", "add", "/photo/trip/"]),
+            (901, "Duplicated", ["folder", "add", "/photo/other", f"{photo}/other"]),
+            (903, "", ["folder", "add", "/photo/../photos/trip"]),
+            (903, f"it is a link to {photo}/trip", ["folder", "add", "/photo/other", "/photo/link"]),
+            (903, "there is no such folder", ["folder", "add", "/photo/none"]),
+            (903, "", ["folder", "set", "/photo/none", "--kinds", "all"]),
+            (903, "there is no such folder", ["folder", "add", "/gone"]),
+            (None, "is a file", ["folder", "add", "/photo/file.txt"]),
+            (None, "neither", ["folder", "add", "/phot/trip"]),
+            (902, "folder list", ["folder", "delete", "/photo/trip", "/photo/other"]),
+            (902, "folder list", ["folder", "delete", "/photos/trip"]),
+            (902, "folder list", ["folder", "get", "/photo"]),
+            (None, "no folder of share", ["folder", "reindex", "/photos/trip"]),
+            (800, "share list", ["share", "pause", "phot"]),
+            (None, "no folder of share", ["share", "pause", "photos"]),
+            (None, "not paused", ["share", "forget", "photo"]),
+            (None, "already", ["share", "rename", "photo", "photos"]),
+            (None, "no share", ["share", "rename", "nonexistent", "photo"]),
+            (None, "not there", ["share", "rename", "gone", "here"]),
+            (None, "already", ["share", "migrate", "photo", photo]),
+            (None, "", ["share", "migrate", "photo", f"{self.vol}/nowhere"]),
+            (800, "homes", ["user", "rename", "a", "b"]),
+            (800, "share list", ["suggest-refresh", "nonexistent"]),
+        ]
+        for code, text, words in rows:
+            with self.subTest(words=words):
+                self.expect_refused(code, *words, text=text)
+        self.assertIn(b"no indexed folder", self.ctl("volume", "pause", f"{self.vol}/pho"))
+        for number in range(1000):
+            os.makedirs(f"{photo}/many/{number}")
+        begin = time.monotonic()
+        self.expect_refused(900, "folder", "add", *(f"/photo/many/{number}" for number in range(1000)))
+        self.assertLess(time.monotonic() - begin, 5)
+        os.mkdir(f"{self.instance.root}/var/packages/Ferrox/etc/fileindex.folders.new")  # stops root's writing, too
+        self.expect_refused(505, "folder", "add", "/photo/other", text="cannot write")
+
+    def test_daemons_that_do_not_run(self):
+        docs = self.share_without_folders("docs")
+        done = self.instance.run("folder", "add", "/docs")
+        self.assertIn("'fileindexctl up' (error 913)", done.stderr.decode())
+        self.assertEqual((3, []), (done.returncode, self.instance.folders()))
+        media = f"{self.vol}/media"
+        os.makedirs(media)
+        done = self.instance.run("share", "add", media)
+        self.assertEqual(3, done.returncode)
+        self.assertIn("fileindexctl folder add /media", done.stderr.decode())
+        self.assertIn(b"media", self.ctl("share", "list"))
+        self.ctl("up")
+        self.ctl("folder", "add", "/docs", "/media")
+        self.expect_documents("docs", docs, docs)
+        self.instance.kill("fileindexd")
+        for words in (["folder", "delete", "/docs"], ["share", "pause", "docs"], ["volume", "pause", self.vol]):
+            self.expect_refused(502, *words, text="fileindexctl up")
+        write(f"{docs}/a.txt", "ibex")
+        self.ctl("folder", "set", "/docs", "--kinds", "none")  # starts the index daemon
+        self.ctl("folder", "set", "/docs", "--kinds", "document")
+        self.ctl("index", "docs", "--wait")
+        self.expect_found("ibex", f"{docs}/a.txt")
+        self.instance.kill("kovaelasticd")
+        self.expect_refused(913, "folder", "delete", "/docs", text="fileindexctl up")
+        self.expect_refused(913, "share", "rename", "docs", "papers", text="fileindexctl up")
+        self.assertTrue(os.path.isdir(docs))
+
+    def test_changes_at_once_all_land_and_a_killed_one_tears_nothing(self):
+        self.ctl("up")
+        docs = self.share_without_folders("docs")
+        for number in range(40):
+            os.makedirs(f"{docs}/d{number}")
+
+        def add(number):
+            return subprocess.Popen([os.path.join(BIN, "fileindexctl"), "folder", "add", f"/docs/d{number}"],
+                                    env=self.instance.env, stdout=subprocess.DEVNULL, stderr=subprocess.PIPE)
+        running = [add(number) for number in range(20)]
+        for process in running:
+            self.assertEqual((b"", 0), (process.communicate(timeout=100)[1], process.returncode))
+        self.assertEqual({f"/docs/d{number}" for number in range(20)}, {f["path"] for f in self.instance.folders()})
+        for number in range(20, 40):
+            process = add(number)
+            time.sleep((number - 20) * 0.001)
+            process.send_signal(signal.SIGKILL)
+            process.communicate()
+            self.assertGreaterEqual(len(self.instance.folders()), 20)
+        present = [int(f["path"][len("/docs/d"):]) for f in self.instance.folders()]
+        missing = [number for number in range(40) if number not in present]
+        if missing:
+            self.ctl("folder", "add", *(f"/docs/d{number}" for number in missing))
+        self.ctl("index", "docs", "--wait")
+        self.expect_documents("docs", docs, *(f"{docs}/d{number}" for number in range(40)))
+
+    def test_interrupted_rename_is_finished_by_the_same_command(self):
+        self.ctl("up")
+        docs = self.share_without_folders("docs")
+        write(f"{docs}/a.txt", "lemur")
+        self.ctl("folder", "add", "/docs")
+        self.expect_documents("docs", docs, docs)
+        names = ["docs", "n0", "n1", "n2", "n3", "n4", "n5"]
+        for round_number, (old, new) in enumerate(zip(names, names[1:])):
+            rename = ["share", "rename", old, new]
+            process = subprocess.Popen([os.path.join(BIN, "fileindexctl"), *rename], env=self.instance.env,
+                                       stdout=subprocess.DEVNULL, stderr=subprocess.DEVNULL)
+            time.sleep(round_number * 0.0015)
+            process.send_signal(signal.SIGKILL)
+            if process.wait() != 0:
+                done = self.instance.run(*rename)  # refused only when nothing was left to do
+                self.assertTrue(done.returncode == 0 or b"there is no share" in done.stderr, done.stderr)
+            self.expect_documents(new, f"{self.vol}/{new}", f"{self.vol}/{new}")
+            self.expect_found("lemur", f"{self.vol}/{new}/a.txt")
+            self.assertEqual({f"fileindex_{new}"}, set(self.indices()))
+
+
+if __name__ == "__main__":
+    unittest.main()
