@@ -42,9 +42,10 @@ class FERROX_EXPORT QueueMgr {
   int ProcessOP(const std::function<void(std::shared_ptr<OP>)>& fn, bool use_tmp);
 
   /// Whether either queue holds an event that touches `full_path` or anything below it. Reads without the lock.
-  /// @throws Error kInternal when a queue cannot be opened; kMalformedEvent or kBadArgument at a bad line.
+  /// @throws Error kInternal when a queue cannot be opened; kMalformedEvent or kBadArgument at a bad line; as FolderMgr
+  /// does when the folders cannot be loaded.
   bool IsFullPathProcessing(const std::string& full_path);
-  /// Whether either queue holds a pure reindex event that covers `full_path`. Throws likewise.
+  /// Whether either queue holds a pure reindex event that covers `full_path`. Throws as above for the queue.
   bool IsFullPathHasReindex(const std::string& full_path);
 
  private:

@@ -13,6 +13,8 @@ EXPECTED = ["ferrox::Error::what() const", "ferrox::LockFile::~LockFile()", "fer
             "ferrox::SendCommandToDaemon(", "ferrox::fileindex::AddCustomEvent(", "typeinfo for ferrox::Error",
             "ferrox::fileindex::StatusMgr::Pause(int)", "ferrox::fileindex::elastic::SendRequestImpl(",
             "ferrox::fileindex::OPTree::ProcessOP(", "ferrox::fileindex::QueueMgr::PrepareTmpQueue()",
+            "ferrox::fileindex::FolderMgr::Upsert(", "ferrox::fileindex::FolderMgr::GetMostSuitableCfg(",
+            "ferrox::fileindex::FolderMgr::FolderMgr()", "ferrox::fileindex::Folder::GetStatus(",
             "ferrox::fileindex::log_level"]
 EXPECTED += ["ferrox::fileindex::" + entry_point + "(" for entry_point in
              ("FolderAdd", "FolderSet", "FolderReindex", "FolderDelete", "FolderGet", "FolderList", "ShareRename",
