@@ -1,5 +1,8 @@
 #include "fileindex/folder.h"
 
+#include <array>
+#include <random>
+
 #include "common/new_class.h"
 #include "fileindex/folder_mgr.h"
 #include "fileindex/folder_status.h"
@@ -142,18 +145,25 @@ TEST_F(FolderTest, ManyAreToldWhatOneIsTold) {
                            "/music/a/b", "/music/c", "/gone/a", "/gone/b", "gone"}) {
     folders.push_back(NewFolder(path));
   }
-  using Lines = std::vector<std::string>;
-  const std::string photo = volume_ / "photo";
-  for (const auto& [live, detached] :
-       {std::pair<Lines, Lines>{},
-        {{test::Create(photo + "/a/x")}, {}},
-        {{test::Modify(photo + "/abc")}, {"bad"}},
-        {{test::Rename(photo + "/a/b", volume_ / "music/c/x")}, {test::Create(photo + "/ab")}},
-        {{test::Create(photo + "/a"), "bad", test::Create(photo + "/ab")}, {test::Create(photo + "/ab")}},
-        {{"{}"}, {}}}) {
+  const unsigned seed = std::random_device{}();
+  SCOPED_TRACE(seed);
+  std::mt19937 random(seed);
+  const auto place = [&] {
+    return volume_ /
+           std::array{"photo", "photo/x", "photo/a", "photo/a/b/x", "photo/abc", "photo/ab", "music/c"}[random() % 7];
+  };
+  const auto queue = [&] {
+    std::vector<std::string> lines(random() % 10);
+    for (std::string& line : lines) {
+      const unsigned dice = random() % 20;
+      line = dice == 0 ? "bad" : dice == 1 ? "{}" : dice < 5 ? test::Rename(place(), place()) : test::Create(place());
+    }
+    return lines;
+  };
+  for (int round = 0; round < 40; ++round) {
     for (const char* share : {"photo", "music"}) {
-      test::WriteQueue(queue_[share], live);
-      test::WriteQueue(queue_[share] + ".tmp", detached);
+      test::WriteQueue(queue_[share], queue());
+      test::WriteQueue(queue_[share] + ".tmp", queue());
     }
     platform_.calls.clear();
     FolderStatus together(folders);
