@@ -11,7 +11,8 @@ namespace ferrox::indexd {
 
 /// The indexed folders of one share as they were configured at one moment: what decides, whatever the disk holds, which
 /// paths have a document and of which files the content is read. Of folders that lie in each other the deepest governs.
-/// Only the share's own folders count, also where another share lies in it. Safe for several threads.
+/// Only the share's own folders count, also where another share lies in it. Whether the share has a recycle bin, which
+/// is not indexed, is part of the configuration. Safe for several threads.
 class ShareFolders {
  public:
   enum class Place {
@@ -23,7 +24,7 @@ class ShareFolders {
   /// No folders.
   ShareFolders() = default;
   /// The folders of `share`, whose own folder is `root`, as the folders file holds them now.
-  /// @throws Error kLoadFailed; kBadArgument.
+  /// @throws Error kLoadFailed; kBadArgument; kNoSuchShare; kInternal.
   static ShareFolders Load(const std::string& share, const std::string& root);
 
   bool operator==(const ShareFolders& other) const = default;
@@ -43,6 +44,7 @@ class ShareFolders {
   /// The kinds under which the path lies; null when it is under no folder.
   const Kinds* Governing(std::string_view full_path) const;
 
+  bool recycle_bin_ = false;
   std::map<std::string, Kinds, std::less<>> kinds_;  ///< by full path
 };
 
