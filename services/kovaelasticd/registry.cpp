@@ -160,6 +160,8 @@ void Registry::Move(const std::string& id, const std::string& new_id, const std:
   const bool at_source = IsFileExist(IndexFile(entry->path));
   FERROX_FAIL_IF(to_path != entry->path && at_target && at_source, Error::kEngineIndexExists,
                  "there is another index in " + to_path + "; remove it first");
+  // What a killed engine has left beside the file goes into it first.
+  if (at_source && IsFileExist(IndexFile(entry->path) + "-wal")) OpenEntry(*entry, entry->path, false);
   CloseEntry(*entry);
   {
     const std::lock_guard<std::mutex> guard(mutex_);
