@@ -12,6 +12,7 @@
 #include "common/log.h"
 #include "common/unique_fd.h"
 #include "services/fileindexd/file_count.h"
+#include "services/fileindexd/stray_documents.h"
 
 namespace ferrox::indexd {
 
@@ -22,17 +23,6 @@ using fileindex::FileIndexOP;
 constexpr auto kCommitInterval = std::chrono::seconds(5);
 /// A comparison that has seen so many files tells how many there are.
 constexpr uint64_t kFilesBeforeCount = 500;
-
-/// The shallowest folder at or above `path` that does not hold `root`; "" when the path itself does.
-std::string TopBeside(const std::string& path, const std::string& root) {
-  size_t end = 0;
-  do {
-    end = path.find('/', end + 1);
-    const std::string top = path.substr(0, end);
-    if (!StringStartWith(root + "/", top + "/")) return top;
-  } while (end != std::string::npos);
-  return "";
-}
 
 }  // namespace
 
@@ -206,25 +196,16 @@ void OperationRunner::Compare(const std::string& path) {
 }
 
 void OperationRunner::CompareRoot() {
-  RemoveOutsideRoot();
+  RemoveStrays();
   CompareFolder(context_.root);
 }
 
 /// After the share was renamed or moved, what could not be taken along is left behind under the old name.
-void OperationRunner::RemoveOutsideRoot() {
-  const std::string& root = context_.root;
-  const std::string behind = root + "0";  // "0" follows "/": no path below the root comes behind it
-  const auto first_of = [this](const std::vector<IndexedEntry>& found) {
-    return found.empty() || StringStartWith(found.front().path, context_.root + "/") ? "" : found.front().path;
-  };
-  while (true) {
-    std::string stray = first_of(context_.index.List("", "", 1));
-    if (stray.empty()) stray = first_of(context_.index.Find(behind));
-    if (stray.empty()) stray = first_of(context_.index.List("", behind, 1));
-    if (stray.empty()) return;
+void OperationRunner::RemoveStrays() {
+  for (std::string stray; !(stray = FindStray(context_.index, context_.root)).empty();) {
     context_.interruption.Check();
-    const std::string top = TopBeside(stray, root);
-    top.empty() ? writer_.Remove(stray) : writer_.RemoveTree(top);
+    const std::string folder = FolderOfStrays(stray, context_.root);
+    folder.empty() ? writer_.Remove(stray) : writer_.RemoveTree(folder);
   }
 }
 

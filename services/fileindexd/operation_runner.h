@@ -77,7 +77,7 @@ class OperationRunner {
   void CompareOnce(const std::string& path);
   void Compare(const std::string& path);
   void CompareRoot();
-  void RemoveOutsideRoot();
+  void RemoveStrays();
   void CompareOne(const std::string& path, Place place, const struct stat& status);
   void CompareFolder(const std::string& folder);
   ComparisonActions Actions(const std::string& folder);

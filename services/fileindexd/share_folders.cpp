@@ -1,7 +1,6 @@
 #include "services/fileindexd/share_folders.h"
 
 #include "common/file_util.h"
-#include "common/paths.h"
 #include "fileindex/folder_mgr.h"
 #include "fileindex/util.h"
 #include "sdk/share.h"
@@ -11,8 +10,6 @@ namespace ferrox::indexd {
 ShareFolders ShareFolders::Load(const std::string& share, const std::string& root) {
   ShareFolders loaded;
   loaded.recycle_bin_ = sdk::SDKShare(share).IsEnableRecycleBin();
-  // Until folders can be added, a share is indexed whole.
-  if (!IsFileExist(InstancePath(kFileIndexFoldersCfgPath))) loaded.kinds_[root] = {true, true, true, true};
   const fileindex::FolderMgr folder_mgr;
   for (const auto& folder : folder_mgr.GetFolders()) {
     const std::string& path = folder->GetPath();

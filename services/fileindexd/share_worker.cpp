@@ -23,6 +23,7 @@
 #include "sdk/share.h"
 #include "services/fileindexd/operation_runner.h"
 #include "services/fileindexd/path_rules.h"
+#include "services/fileindexd/stray_documents.h"
 
 namespace ferrox::indexd {
 
@@ -136,6 +137,10 @@ milliseconds ShareWorker::Round() {
     delay_ = milliseconds(0);
     last_failure_ = 0;
     told_no_space_ = false;
+    if (AwaitsRename()) {
+      status_.SetState(ShareStatus::State::kStarting, "the index is that of an earlier name or place of the share");
+      return milliseconds(500);
+    }
     status_.SetState(ShareStatus::State::kIdle);
     return watch_.SeesChanges() ? kSlowTimer : kSlowTimerWithoutWatch;
   } catch (const Interrupted&) {
@@ -229,7 +234,7 @@ void ShareWorker::EnsureIndex() {
   if (!index_->Exists()) {
     const auto now = std::chrono::steady_clock::now();
     if (!index_missing_since_) index_missing_since_ = now;
-    FERROX_FAIL_IF(now - *index_missing_since_ < environment_.missing_index_patience, Error::kEngineNoSuchIndex,
+    FERROX_FAIL_IF(now - *index_missing_since_ < environment_.rename_patience, Error::kEngineNoSuchIndex,
                    "the share has no index yet");
     MakeMissingIndex();
   }
@@ -247,6 +252,20 @@ void ShareWorker::MakeMissingIndex() {
   Log(LOG_WARNING, "the index of share %s is gone; it is made anew", share_.c_str());
   (void)QueueReindex();
   index_->Create();
+}
+
+/// Whether documents have paths of before the share was renamed or moved, although the queue is empty: the event that
+/// tells of it is yet to come. If it does not, the share is marked.
+bool ShareWorker::AwaitsRename() {
+  if (strays_looked_for_) return false;
+  strays_looked_for_ = FindStray(*index_, root_).empty();
+  if (strays_looked_for_) return false;
+  const auto now = std::chrono::steady_clock::now();
+  if (!strays_since_) strays_since_ = now;
+  if (now - *strays_since_ >= environment_.rename_patience) {
+    StatusMgr().SetShareStatus(share_, StatusMgr::kNeedReindex);
+  }
+  return true;
 }
 
 /// Turns the share's mark into a queued reindex.

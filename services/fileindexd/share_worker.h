@@ -50,8 +50,9 @@ class ShareWorker {
     std::function<std::unique_ptr<ShareIndex>(const std::string& share)> open_index = &EngineShareIndex;
     /// A queue that has just changed is left for so long, since changes seldom come alone.
     std::chrono::milliseconds gather_time{100};
-    /// An index that has been missing for so long is made anew; one that is being renamed is missing for a moment.
-    std::chrono::milliseconds missing_index_patience = std::chrono::seconds(5);
+    /// While a share is renamed, its index is missing for a moment, and then the event that tells of it. Longer than
+    /// this, they are lost.
+    std::chrono::milliseconds rename_patience = std::chrono::seconds(5);
   };
 
   /// @throws Error kNoSuchShare; kInternal.
@@ -85,6 +86,7 @@ class ShareWorker {
   void CheckShare();
   void EnsureIndex();
   void MakeMissingIndex();
+  bool AwaitsRename();
   void QueueNeededReindex();
   bool QueueReindex();
   void RunPass();
@@ -99,6 +101,8 @@ class ShareWorker {
   std::unique_ptr<ShareIndex> index_;
   bool index_exists_ = false;
   std::optional<std::chrono::steady_clock::time_point> index_missing_since_;
+  bool strays_looked_for_ = false;
+  std::optional<std::chrono::steady_clock::time_point> strays_since_;
   std::optional<ShareFolders> last_folders_;  ///< what the last finished pass went by
   std::atomic<uint64_t> folder_count_{0};
   int last_failure_ = 0;

@@ -8,9 +8,7 @@
 #include <vector>
 
 #include "common/error.h"
-#include "common/file_util.h"
 #include "common/log.h"
-#include "common/paths.h"
 #include "fileindex/folder_mgr.h"
 #include "sdk/share.h"
 
@@ -66,10 +64,6 @@ std::map<std::string, WorkerSet::IndexedShare> WorkerSet::IndexedShares() {
     if (existing.count(share) == 0) continue;
     IndexedShare& indexed = shares[share];
     indexed.all_paused = indexed.all_paused && folder->IsPaused();
-  }
-  // Until folders can be added, each share is indexed.
-  if (!IsFileExist(InstancePath(kFileIndexFoldersCfgPath))) {
-    for (const std::string& share : names) shares[share].all_paused = false;
   }
   for (auto& [share, indexed] : shares) indexed.root = sdk::SDKShare(share).GetPath();
   return shares;

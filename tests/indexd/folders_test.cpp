@@ -1,3 +1,5 @@
+#include <unistd.h>
+
 #include <functional>
 
 #include "fileindex/status_mgr.h"
@@ -39,6 +41,9 @@ class FoldersTest : public WorkerTest {
     size_t count = 0;
     for (const auto& [path, times] : index->upserts) count += static_cast<size_t>(times);
     return count;
+  }
+  void WaitUntilIdle() {
+    for (int i = 0; i < 6000 && worker->Status()["state"] != "idle"; ++i) usleep(10000);
   }
   void StartWith(const Folders& folders) {
     SetFolders(folders);
@@ -151,9 +156,9 @@ TEST_F(FoldersTest, ChangeSwallowedByAReindexElsewhereIsMadeUpFor) {
 TEST_F(FoldersTest, RenamedShareTakesItsDocumentsAlong) {
   const std::string old_root = root;
   const std::string old_share = share;
-  for (const bool told : {true, false}) {
+  for (const unsigned event : {kRename, kReindex, 0U}) {
     for (const Folders& folders : kConfigurations) {
-      SCOPED_TRACE(testing::PrintToString(folders) + (told ? " told" : " not told"));
+      SCOPED_TRACE(testing::PrintToString(folders) + " event " + std::to_string(event));
       MakeTree();
       StartWith(folders);
       kept = index->documents;
@@ -167,11 +172,13 @@ TEST_F(FoldersTest, RenamedShareTakesItsDocumentsAlong) {
       queue_path = sdk::SDKShare(share).GetQueuePath();
       SetFolders(folders);
       worker = MakeWorker();
-      Process(told ? Line(kRename, root, old_root) : Line(kReindex, root));
+      if (event != 0) Queue(Line(event, root, old_root));
+      worker->Start();
+      WaitUntilIdle();
       EXPECT_EQ(Expected(), Indexed());
       size_t files = 0;
       for (const auto& [path, times] : index->upserts) files += fs::is_directory(path) ? 0 : 1;
-      EXPECT_TRUE(!told || files == 0) << "files are not read again";
+      EXPECT_TRUE(event != kRename || files == 0) << "files are not read again";
       Configure(share, {});
       fs::rename(root, old_root);
       kova::host::RenameShare(share, old_share, old_root);

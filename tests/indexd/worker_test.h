@@ -78,7 +78,7 @@ class WorkerTest : public testing::Test {
                                            return fake;
                                          }};
     environment.gather_time = std::chrono::milliseconds(0);
-    environment.missing_index_patience = patience;
+    environment.rename_patience = patience;
     return std::make_unique<ShareWorker>(share, environment);
   }
 
