@@ -142,6 +142,37 @@ class DaemonsTest(unittest.TestCase):
         self.instance.ctl("index", "docs", "--wait")
         self.expect_index_is_disk("docs", folder)
 
+    def test_paused_share_stops_at_once_and_goes_on_where_it_was(self):
+        folder = self.up_with_share()
+        self.instance.wait_idle("docs", folder)
+        self.fill(folder, 4000)
+        self.instance.ctl("index", "docs")
+        wait_for(lambda: self.instance.share_status("docs")["written"] > 100, "indexing to begin")
+        begin = time.monotonic()
+        self.instance.ctl("share", "pause", "docs")
+        self.assertLess(time.monotonic() - begin, 1)
+        self.assertEqual([], self.instance.status()["index_daemon"]["shares"])
+        self.instance.ctl("share", "resume", "docs")
+        done = self.instance.share_status("docs")["index"]["documents"]
+        self.assertTrue(100 < done < 4050, done)
+        self.instance.wait_idle("docs", folder)
+        self.expect_index_is_disk("docs", folder)
+        self.assertLess(self.instance.share_status("docs")["written"], 4100 - done)
+
+    def test_switched_kind_touches_its_files_alone(self):
+        folder = self.up_with_share()
+        self.instance.wait_idle("docs", folder)
+        self.fill(folder, 10000)
+        for i in range(10):
+            write(f"{folder}/d{i}/view.jpg", "no real picture")
+        self.instance.ctl("index", "docs", "--wait")
+        written = self.instance.share_status("docs")["written"]
+        self.instance.ctl("folder", "set", "/docs", "--kinds", "document,audio,video")
+        self.instance.wait_idle("docs", folder)
+        status = self.instance.share_status("docs")
+        self.assertEqual(10, status["written"] - written)
+        self.assertEqual(10060, status["comparison"]["examined"], "all were looked at")
+
     def test_bad_clients_cost_their_own_connection(self):
         self.up_with_share()
         for daemon in ("kovaelasticd", "fileindexd"):
