@@ -84,6 +84,19 @@ Words CommandWords(const std::string& first) {
   return found;
 }
 
+/// "--kinds=au" gives "--kinds=audio".
+Words JoinedOptionWords(const Command& command, const std::string& typed) {
+  const size_t value = typed.find('=') + 1;
+  Words found;
+  for (const Option& option : command.options) {
+    if (option.value == nullptr || typed.compare(0, value - 1, option.name) != 0) continue;
+    for (const std::string& candidate : Candidates(option.value, typed.substr(value))) {
+      found.push_back(candidate[0] == ':' ? candidate : typed.substr(0, value) + candidate);
+    }
+  }
+  return found;
+}
+
 /// Of a command, the last of the words given behind its name.
 Words ArgumentWords(const Command& command, const Words& given) {
   const std::string& typed = given.back();
@@ -99,6 +112,7 @@ Words ArgumentWords(const Command& command, const Words& given) {
     }
   }
   if (pending != nullptr) return Candidates(pending->value, typed);
+  if (typed.compare(0, 2, "--") == 0 && typed.find('=') != std::string::npos) return JoinedOptionWords(command, typed);
   if (typed.compare(0, 1, "-") == 0) {
     Words found = {"--help"};
     for (const Option& option : command.options) found.emplace_back(option.name);

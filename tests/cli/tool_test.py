@@ -108,6 +108,7 @@ class ToolTest(unittest.TestCase):
             (["index", "ph"], ["photo", "photos"]), (["search", "--share", "photos"], ["photos"]),
             (["search", "--sort", "s"], ["size"]), (["folder", "list", "--st"], ["--status"]),
             (["folder", "add", "x", "--kinds", "document,v"], [":open", "document,video"]),
+            (["folder", "add", "x", "--kinds=document,v"], [":open", "--kinds=document,video"]),
             (["folder", "delete", "/photos"], [":open", "/photos/a b", "/photos"]),
             (["folder", "add", "/photo/tr"], [":open", "/photo/tree", "/photo/trip"]),
             (["share", "add", ""], [":folders"]), (["queue", "show", ""], [":files"]), (["share", "forget", "photo", ""], [":folders"]),
