@@ -158,10 +158,20 @@ void Follow(const Move& move, void (*move_index)(const Move& move), const std::s
   }
 }
 
+/// Whether the share's index still has documents of its old place.
+bool HasDocumentsBelow(const std::string& share, const std::string& old_path) {
+  Json::Value data;
+  data["id"] = fileindex::elastic::GetFileIndexID(share);
+  data["query"]["qsl"]["prefix"]["KOVAMDPath"] = old_path + "/";
+  data["query"]["limit"] = 1;
+  return HasIndex(share) && !AskEngine("document_get_by_query", data).empty();
+}
+
 /// Whether anything still bears the share's old name or lies at its old place.
-bool HasRemains(const std::string& name, const std::string& old_path) {
-  const std::string queue = QueueOf(old_path);
-  return fileindex::FolderMgr().IsShareIndexed(name) || HasIndex(name) || Exists(queue) || Exists(queue + ".tmp");
+bool HasRemains(const Move& move) {
+  const std::string queue = QueueOf(move.old_path);
+  return fileindex::FolderMgr().IsShareIndexed(move.old_name) || HasIndex(move.old_name) || Exists(queue) ||
+         Exists(queue + ".tmp") || IsPaused(move.new_name) || HasDocumentsBelow(move.new_name, move.old_path);
 }
 
 /// Has the share renamed where it is kept, unless that was done before.
@@ -174,7 +184,7 @@ Move RenameShare(const std::string& from, const std::string& to) {
     }
     const std::string path = IsShare(to) ? sdk::SDKShare(to).GetPath() : "";
     const Move move = {from, to, Dirname(path) + "/" + from, path};
-    if (path.empty() || !HasRemains(from, move.old_path)) {
+    if (path.empty() || !HasRemains(move)) {
       throw Failure("there is no share \"" + from + "\"; 'fileindexctl share list' shows them");
     }
     return move;
@@ -199,7 +209,7 @@ int RunShareRename(const Arguments& arguments) {
   }
   RequireEngine();
   const Move move = RenameShare(from, to);
-  const bool indexed = HasRemains(from, move.old_path) || fileindex::FolderMgr().IsShareIndexed(to);
+  const bool indexed = HasRemains(move) || fileindex::FolderMgr().IsShareIndexed(to);
   if (indexed) Follow(move, &RenameIndex, "fileindexctl share rename " + from + " " + to);
   (void)printf("share %s is now %s: %s%s\n", EscapeForTerminal(from).c_str(), EscapeForTerminal(to).c_str(),
                EscapeForTerminal(move.new_path).c_str(), indexed ? "; its index follows" : "");
