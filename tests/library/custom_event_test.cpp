@@ -1,7 +1,10 @@
+#include "fileindex/custom_event.h"
+
 #include <sys/resource.h>
 
 #include <csignal>
 #include <memory>
+#include <random>
 
 #include "common/lock_file.h"
 #include "fileindex/optree.h"
@@ -9,6 +12,7 @@
 #include "fileindex/util.h"
 #include "sdk/share.h"
 #include "tests/support/library_test.h"
+#include "tests/support/queue_lines.h"
 
 namespace ferrox::fileindex {
 
@@ -109,6 +113,38 @@ TEST_F(AddCustomEventTest, AShortWriteIsTakenBack) {
     ASSERT_EQ(setrlimit(RLIMIT_FSIZE, &unlimited), 0);
     EXPECT_EQ(ReadFile(queue_), before);
     EXPECT_TRUE(log_.Contains("reason: Failed to write queue, reason="));
+  }
+}
+
+TEST_F(AddCustomEventTest, AWriterQueuesWhatEventsOneByOneWould) {
+  std::mt19937 random(20);
+  const auto path = [&random] {
+    std::string text = "/v/photo";
+    for (unsigned depth = random() % 3; depth > 0; --depth) text += random() % 2 == 0 ? "/a" : "/b";
+    return random() % 40 == 0 ? "/elsewhere" : text;
+  };
+  for (int round = 0; round < 60; ++round) {
+    std::string live, detached;
+    for (std::string* queue : {&live, &detached}) {
+      if (random() % 4 == 0) *queue = test::Line(random() % 2 == 0 ? EVENT_REINDEX : EVENT_CREATE, path()) + "\n";
+      if (random() % 8 == 0) *queue += "no event\n";
+    }
+    std::vector<std::pair<int, std::string>> events(5);
+    for (auto& event : events) event = {random() % 4 == 0 ? EVENT_REINDEX : EVENT_UPDATE_CFG, path()};
+    std::string results[2];
+    for (const bool one_by_one : {false, true}) {
+      SetUp();
+      WriteFile(queue_, live);
+      WriteFile(queue_ + ".tmp", detached);
+      results[one_by_one] = test::FailureOf([&] {
+        CustomEventWriter writer;
+        for (const auto& [event, at] : events) {
+          one_by_one ? AddCustomEvent(event, at, "", Json::Value()) : writer.Add(event, at, "", Json::Value());
+        }
+      });
+      results[one_by_one] += "\n" + ReadFile(queue_) + ReadFile(InstancePath(kFileIndexStatusCfgPath));
+    }
+    EXPECT_EQ(results[0], results[1]) << "round " << round;
   }
 }
 

@@ -2,7 +2,6 @@
 
 #include <unistd.h>
 
-#include <algorithm>
 #include <map>
 #include <memory>
 
@@ -27,32 +26,37 @@ class IndexMgrTest : public test::LibraryTest {
     platform_.engine = [this](const std::string& request) { return Answer(test::Parse(request)); };
     engine_fails_.clear();
     daemon_runs_ = true;
-    names_.clear();
     for (const char* name : {"photo", "photos", "homes"}) AddShare(name, "/volume1/");
     AddShare("music", "/volume10/");
     for (const std::string& file : {folders_, folders_ + ".new", status_}) (void)fs::remove_all(file);
     test::WriteFile(InstancePath(kElasticdSocket), "");
   }
-
   void AddShare(const std::string& name, const std::string& volume) {
     platform_.shares[name] = {test::TestRoot() + volume + name};
     fs::create_directories(platform_.shares[name].path + "/a/b");
     queues_[name] = sdk::SDKShare(name).GetQueuePath();
     (void)fs::remove(queues_[name]);
-    names_.insert(names_.begin(), {{queues_[name], name}, {sdk::SDKShare(name).GetDBPath(), name + ".index"}});
+    short_.insert(short_.begin(), {{queues_[name], name}, {sdk::SDKShare(name).GetDBPath(), name + ".index"}});
   }
 
-  /// The stored form of a folder with the kinds named by their first letters.
-  static Json::Value Entry(const std::string& path, const std::string& kinds = "dp") {
-    const auto has = [&kinds](char kind) { return kinds.find(kind) != std::string::npos; };
-    return Folder(path, "n", has('d'), has('a'), has('v'), has('p'), false, false).GetData();
-  }
   static Json::Value List(const std::vector<Json::Value>& elements) {
     Json::Value list(Json::arrayValue);
     for (const Json::Value& element : elements) list.append(element);
     return list;
   }
-  void Store(const std::vector<Json::Value>& folders) { ASSERT_TRUE(toFile(List(folders), folders_)); }
+  /// The stored form of folders "<path>[ <kinds>]; ", the kinds by their first letters, "dp" when none are given.
+  static Json::Value Folders(const std::string& text) {
+    Json::Value list(Json::arrayValue);
+    for (size_t at = 0, end = 0; at < text.size(); at = end + 2) {
+      end = std::min(text.find(';', at), text.size());
+      const size_t blank = std::min(text.find(' ', at), end);
+      const std::string kinds = blank < end ? text.substr(blank, end - blank) : "dp";
+      const auto has = [&kinds](char kind) { return kinds.find(kind) != std::string::npos; };
+      list.append(Folder(text.substr(at, blank - at), "n", has('d'), has('a'), has('v'), has('p'), 0, 0).GetData());
+    }
+    return list;
+  }
+  void Store(const std::string& folders) { ASSERT_TRUE(toFile(Folders(folders), folders_)); }
   /// The stored folders, each as "<path> <kinds>[ paused][ <volume>]; ".
   std::string Stored() const {
     const FolderMgr mgr;
@@ -66,52 +70,39 @@ class IndexMgrTest : public test::LibraryTest {
 
   /// How the call fails, with a daemon that answers.
   std::string Failure(const std::function<void()>& call) {
-    const auto serve = [this](int fd) { ServeCommand(fd); };
+    const auto serve = [this](int fd) { Serve(fd); };
     std::unique_ptr<test::UnixServer> daemon;
     if (daemon_runs_) daemon = std::make_unique<test::UnixServer>(InstancePath(kFileIndexdSocket), serve, 100);
     return test::FailureOf(call);
   }
-  /// What the call does, each step followed by "; ", and at the end what it throws.
-  std::string Effects(const std::function<void()>& call) {
+  /// What the operation does, each step followed by "; ", and at the end what it throws.
+  template <typename Operation, typename... Arguments>
+  std::string Does(const Operation& operation, const Arguments&... arguments) {
     NoticeFiles();
     done_.clear();
-    platform_.on_call = [this](const std::string& platform_call) { OnCall(platform_call); };
-    const std::string failure = Failure(call);
+    platform_.on_call = [this](const std::string& call) { OnCall(call); };
+    const std::string failure = Failure([&] { operation(arguments...); });
     platform_.on_call = nullptr;
     NoticeFiles();
     return done_ + (failure.empty() ? "" : "throws " + Short(failure));
   }
 
-  const std::string folders_ = InstancePath(kFileIndexFoldersCfgPath);
-  const std::string status_ = InstancePath(kFileIndexStatusCfgPath);
+  const std::string folders_ = InstancePath(kFileIndexFoldersCfgPath), status_ = InstancePath(kFileIndexStatusCfgPath);
   std::map<std::string, std::string> queues_;  // by share
+  std::map<std::string, int> engine_fails_;    // commands, and the code with which they fail
   bool daemon_runs_ = true;
-  /// Engine commands that fail, with this code.
-  std::map<std::string, int> engine_fails_;
 
  private:
   static std::string Kinds(const Json::Value& config) {
     std::string kinds;
-    for (const char* kind : {"document", "audio", "video", "photo"}) kinds += config[kind].asBool() ? kind[0] : '\0';
-    kinds.erase(std::remove(kinds.begin(), kinds.end(), '\0'), kinds.end());
+    for (const std::string kind : {"document", "audio", "video", "photo"})
+      kinds += kind.substr(0, config[kind].asBool());
     return kinds;
   }
-
-  /// `text` without the test's root, a share's name for its queue, and JSON without quotes and braces.
   std::string Short(std::string text) const {
-    static const std::vector<std::pair<std::string, std::string>> kCalls = {{test::TestRoot(), ""},
-                                                                            {"MonitorQueue::Upsert(", "watch("},
-                                                                            {"MonitorQueue::Delete(", "unwatch("},
-                                                                            {", fileindex, 1)", ")"},
-                                                                            {"KLIBCExec(/bin/rm -rf ", "rm("},
-                                                                            {"\"", ""},
-                                                                            {"{", ""},
-                                                                            {"}", ""}};
-    for (const auto* table : {&names_, &kCalls}) {
-      for (const auto& [from, to] : *table) {
-        for (size_t at = text.find(from); at != std::string::npos; at = text.find(from))
-          text.replace(at, from.size(), to);
-      }
+    for (const auto& [from, to] : short_) {
+      for (size_t at = text.find(from); at != std::string::npos; at = text.find(from))
+        text.replace(at, from.size(), to);
     }
     return text;
   }
@@ -120,28 +111,26 @@ class IndexMgrTest : public test::LibraryTest {
     NoticeFiles();
     done_ += Short(what) + "; ";
   }
-  bool HasChanged(const std::string& path) {
-    const std::string content = test::ReadFile(path);
-    return std::exchange(contents_[path], content) != content;
+  /// What was appended to the file, or all of it when it was replaced; "" when it is as before.
+  std::string News(const std::string& path) {
+    const std::string now = test::ReadFile(path), before = std::exchange(contents_[path], now);
+    return now == before ? "" : now.rfind(before, 0) == 0 ? now.substr(before.size()) : now;
   }
   void NoticeFiles() {
-    if (HasChanged(folders_)) done_ += "saved; ";
-    if (HasChanged(status_)) done_ += "status " + Short(toString(test::Parse(contents_[status_])["share"])) + "; ";
+    if (!News(folders_).empty()) done_ += "saved; ";
+    if (!News(status_).empty()) done_ += "status " + Short(toString(test::Parse(contents_[status_])["share"])) + "; ";
     for (const auto& [share, queue] : queues_) {
-      const size_t before = contents_[queue].size();
-      if (!HasChanged(queue) || contents_[queue].size() <= before) continue;
-      std::istringstream added(contents_[queue].substr(before));
-      for (std::string line; std::getline(added, line);) NoticeEvent(share, Event(line));
+      std::istringstream added(News(queue));
+      for (std::string line; std::getline(added, line);) NoticeEvent("queue " + share, Event(line));
     }
   }
-  void NoticeEvent(const std::string& share, const Event& event) {
-    static const std::map<uint32_t, std::string> kNames = {
-        {EVENT_RENAME, "rename "}, {EVENT_REINDEX, "reindex "}, {EVENT_UPDATE_CFG, "kinds "}};
-    done_ += "queue " + share + ": " + kNames.at(event.event) + Short(event.path_old);
-    done_ += (event.path_old.empty() ? "" : " -> ") + Short(event.path);
+  void NoticeEvent(const std::string& queue, const Event& event) {
+    done_ += queue + (event.event == EVENT_REINDEX  ? ": reindex "
+                      : event.event == EVENT_RENAME ? ": rename "
+                                                    : ": kinds ");
+    done_ += Short(event.path_old) + (event.path_old.empty() ? "" : " -> ") + Short(event.path);
     done_ += (event.data.isNull() ? "" : " [" + Kinds(event.data) + "]") + "; ";
   }
-
   void OnCall(const std::string& call) {
     NoticeFiles();
     for (const char* prefix : {"MonitorQueue::", "KLIBService", "KOVASMBSet", "KLIBCExec("}) {
@@ -150,13 +139,12 @@ class IndexMgrTest : public test::LibraryTest {
   }
   std::string Answer(const Json::Value& request) {
     const std::string command = request.get("command", "compound").asString();
-    const Json::Value changes = command == "index_config_set" ? request["data"]["data"] : Json::Value();
-    Note(command + " " + request["data"]["id"].asString() + (changes.isNull() ? "" : " " + toString(changes)));
-    const auto failing = engine_fails_.find(command);
-    if (failing == engine_fails_.end()) return R"({"success":true,"data":[{"KOVAMDPath":"/doc"}]})";
-    return R"({"success":false,"error":{"msg":"m","code":)" + std::to_string(failing->second) + "}}";
+    const Json::Value changes = command == "index_config_set" ? request["data"]["data"] : Json::Value("");
+    Note(command + " " + request["data"]["id"].asString() + " " + toString(changes));
+    if (engine_fails_.count(command) == 0) return R"({"success":true,"data":[{"KOVAMDPath":"/doc"}]})";
+    return R"({"success":false,"error":{"msg":"m","code":)" + std::to_string(engine_fails_[command]) + "}}";
   }
-  void ServeCommand(int fd) {
+  void Serve(int fd) {
     uint32_t size = 0;
     std::string text(1000, '\0');
     EXPECT_EQ(read(fd, &size, sizeof(size)), 4);
@@ -168,7 +156,16 @@ class IndexMgrTest : public test::LibraryTest {
 
   std::string done_;
   std::map<std::string, std::string> contents_;
-  std::vector<std::pair<std::string, std::string>> names_;
+  /// What Short replaces: the paths of shares, which stand before these, calls by their sense, JSON's punctuation.
+  std::vector<std::pair<std::string, std::string>> short_ = {{test::TestRoot(), ""},
+                                                             {"MonitorQueue::Upsert(", "watch("},
+                                                             {"MonitorQueue::Delete(", "unwatch("},
+                                                             {", fileindex, 1)", ")"},
+                                                             {"KLIBCExec(/bin/rm -rf ", "rm("},
+                                                             {" \"\"", ""},
+                                                             {"\"", ""},
+                                                             {"{", ""},
+                                                             {"}", ""}};
 };
 
 }  // namespace ferrox::fileindex

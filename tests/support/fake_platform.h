@@ -6,6 +6,7 @@
 #include <deque>
 #include <functional>
 #include <map>
+#include <optional>
 #include <set>
 #include <string>
 #include <tuple>
@@ -92,6 +93,8 @@ struct FakePlatform {
   /// The documents registered by MonitorQueue, by application, type and queue path. `failing` and `calls` name the
   /// functions "MonitorQueue::Upsert" and "MonitorQueue::Delete".
   std::map<std::tuple<std::string, int, std::string>, Json::Value> monitor_queues;
+  /// What FILEIDXDBPathCompose gives out, when set.
+  std::optional<std::string> composed_db_path;
   /// Programs run by KLIBCExec and KLIBCExecl (none really runs), and their exit status.
   std::vector<FakeProgram> executed;
   int exec_status = 0;

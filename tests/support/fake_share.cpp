@@ -123,6 +123,8 @@ int FILEIDXGetIndexID(const char* share_name, char* buffer, size_t size) {
 }
 int FILEIDXDBPathCompose(const char* share_path, char* buffer, size_t size) {
   if (FakeCallFails(__func__, share_path)) return -1;
+  const std::optional<std::string>& scripted = FakePlatform::Get().composed_db_path;
+  if (scripted) return kova::CopyOut(*scripted, buffer, size) ? 0 : -1;
   return Give(kova::ComposeDBPath(share_path), buffer, size);
 }
 int FILEIDXQueuePathCompose(const char* share_path, char* buffer, size_t size) {
