@@ -69,6 +69,9 @@ struct FolderLookup {
   const std::string* VolumeOf(const std::string& share);
   /// The entry's full path; null when it has none and so governs nothing. Throws likewise.
   const std::string* FullPathOf(const Folder& folder);
+  /// Enters what is not in yet; of entries that name the same folder, as those of shares that lie in one another may,
+  /// the first. Throws likewise. @return those that govern nothing.
+  std::string Fill(const std::vector<std::shared_ptr<Folder>>& folders);
 
   PathTable<std::shared_ptr<Folder>> by_full_path;
 
@@ -98,6 +101,19 @@ const std::string* FolderLookup::FullPathOf(const Folder& folder) {
   return volume != nullptr ? &folder.FullPathBelow(*volume) : nullptr;
 }
 
+std::string FolderLookup::Fill(const std::vector<std::shared_ptr<Folder>>& folders) {
+  std::string idle;
+  for (const auto& folder : folders) {
+    const std::string* full_path = FullPathOf(*folder);
+    if (full_path != nullptr) {
+      by_full_path.Insert(*full_path, folder);
+    } else {
+      idle += " " + folder->GetPath();
+    }
+  }
+  return idle;
+}
+
 FolderMgr::FolderMgr() {
   const std::string path = FoldersPath();
   Json::Value folders(Json::arrayValue);
@@ -123,15 +139,7 @@ void FolderMgr::Save() const {
 FolderLookup& FolderMgr::ByFullPath() const {
   if (lookup_ != nullptr) return *lookup_;
   auto lookup = std::make_unique<FolderLookup>();
-  std::string idle;
-  for (const auto& folder : folders_) {
-    const std::string* full_path = lookup->FullPathOf(*folder);
-    if (full_path != nullptr) {
-      lookup->by_full_path.Insert(*full_path, folder);
-    } else {
-      idle += " " + folder->GetPath();
-    }
-  }
+  const std::string idle = lookup->Fill(folders_);
   if (!idle.empty()) {
     Log(LOG_WARNING, "%s: these folders govern nothing, as their share does not exist:%s",
         ModuleName(FERROX_SOURCE).c_str(), idle.c_str());
@@ -174,13 +182,17 @@ void FolderMgr::Delete(std::shared_ptr<Folder>& change, const std::string& path)
 
 void FolderMgr::Remove(const std::string& path, const std::string& full_path) {
   (void)std::erase_if(folders_, [&path](const auto& folder) { return folder->GetPath() == path; });
+  if (lookup_->by_full_path.Find(full_path) == nullptr) return;
   lookup_->by_full_path.Erase(full_path);
+  (void)lookup_->Fill(folders_);
 }
 
 void FolderMgr::DeleteByShare(const std::string& share) {
   const auto is_of_share = [&share](const auto& folder) { return IsOfShare(*folder, share); };
   (void)std::erase_if(folders_, is_of_share);
-  if (lookup_ != nullptr) lookup_->by_full_path.EraseIf(is_of_share);
+  if (lookup_ == nullptr) return;
+  lookup_->by_full_path.EraseIf(is_of_share);
+  (void)lookup_->Fill(folders_);
 }
 
 void FolderMgr::List(std::vector<std::shared_ptr<Folder>>& out, unsigned int& total, unsigned int offset,

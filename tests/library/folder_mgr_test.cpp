@@ -224,19 +224,24 @@ TEST_F(FolderMgrTest, ListGivesSortedPages) {
 
 namespace {
 
+/// The share "b" lies in the share "photo".
+std::string Full(const std::string& path) {
+  return (ferrox::StringStartWith(path + "/", "/b/") ? "/v/photo" : "/v") + path;
+}
+
 /// The rule as it is written down: the longest entry at or above the path, of equal ones the first.
 FolderPtr Naive(const std::vector<FolderPtr>& folders, const std::string& full_path) {
   FolderPtr best;
   for (const FolderPtr& folder : folders) {
-    const bool governs = ferrox::StringStartWith(full_path + "/", "/v" + folder->GetPath() + "/");
-    if (governs && (best == nullptr || folder->GetPath().size() > best->GetPath().size())) best = folder;
+    const bool governs = ferrox::StringStartWith(full_path + "/", Full(folder->GetPath()) + "/");
+    if (governs && (best == nullptr || Full(folder->GetPath()).size() > Full(best->GetPath()).size())) best = folder;
   }
   return best;
 }
 
 /// A path of few different components, some of them empty, some beginnings of others.
 std::string RandomPath(std::mt19937& random) {
-  std::string path = random() % 2 == 0 ? "/photo" : "/music";
+  std::string path = std::array{"/photo", "/music", "/b"}[random() % 3];
   for (unsigned depth = random() % 5; depth > 0; --depth) {
     path += std::string("/") + std::array{"", "b", "bc", "b.d", "/"}[random() % 5];
   }
@@ -249,6 +254,7 @@ TEST_F(FolderMgrTest, LooksUpAsAScanOfTheListDoes) {
   const unsigned seed = std::random_device{}();
   SCOPED_TRACE(seed);
   std::mt19937 random(seed);
+  platform_.shares["b"] = {"/v/photo/b"};
   for (int round = 0; round < 30; ++round) {
     std::vector<std::string> paths(random() % 20);
     for (std::string& path : paths) path = RandomPath(random);
@@ -256,19 +262,21 @@ TEST_F(FolderMgrTest, LooksUpAsAScanOfTheListDoes) {
     FolderMgr mgr;
     for (int step = 0; step < 60; ++step) {
       const std::string path = RandomPath(random);
-      const FolderPtr before = Naive(mgr.GetFolders(), "/v" + path);
-      ASSERT_EQ(mgr.GetMostSuitableCfg("/v" + path), before) << path;
-      ASSERT_EQ(mgr.IsFullPathIndexed("/v" + path), before != nullptr) << path;
-      ASSERT_EQ(mgr.IsFullPathHasOwnCfg("/v" + path), mgr.HasFolder(path)) << path;
+      const FolderPtr before = Naive(mgr.GetFolders(), Full(path));
+      ASSERT_EQ(mgr.GetMostSuitableCfg(Full(path)), before) << path;
+      ASSERT_EQ(mgr.IsFullPathIndexed(Full(path)), before != nullptr) << path;
+      ASSERT_EQ(mgr.IsFullPathHasOwnCfg(Full(path)), before != nullptr && Full(before->GetPath()) == Full(path));
       const unsigned dice = random() % 10;
       if (dice < 3) {
         ASSERT_EQ(Upserted(mgr, path, "av"), Text(FolderMgr::DiffCfg(NewFolder(path, "av"), before)));
       } else if (dice < 6 && mgr.HasFolder(path)) {
+        FolderPtr entry;
+        mgr.Get(entry, path);
         const std::string change = Deleted(mgr, path);
         ASSERT_FALSE(mgr.HasFolder(path)) << "all entries of the path are gone";
-        ASSERT_EQ(change, Text(FolderMgr::DiffCfg(before, Naive(mgr.GetFolders(), "/v" + path))));
+        ASSERT_EQ(change, Text(FolderMgr::DiffCfg(entry, Naive(mgr.GetFolders(), Full(path)))));
       } else if (random() % 50 == 0) {
-        mgr.DeleteByShare("music");
+        mgr.DeleteByShare(random() % 2 == 0 ? "music" : "b");
       }
     }
   }
