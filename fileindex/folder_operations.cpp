@@ -46,10 +46,6 @@ std::string QueueingOf(const Changes& changes) {
   return "queue the changes of " + std::to_string(changes.size()) + " folders";
 }
 
-void AddWatchStep(OperationSteps& steps, const std::string& share, const FolderMgr& folder_mgr) {
-  steps.Add("watch the folders of " + share, [&] { UpsertKOVANotifydCfg(share, folder_mgr); });
-}
-
 void AddNotifySteps(OperationSteps& steps, const std::set<std::string>& shares, bool is_upsert) {
   for (const std::string& share : shares) {
     steps.Add("tell the index daemon of " + share, [&share, is_upsert] { NotifySettingChanged(share, is_upsert); });
@@ -87,7 +83,7 @@ void FolderUpsert(const Json::Value& folder_list, bool create, bool updater_mode
     }
     AddWatchStep(steps, share, folder_mgr);
   }
-  steps.Add("save the folders", [&folder_mgr] { folder_mgr.Save(); });
+  AddSaveStep(steps, folder_mgr);
   AddNotifySteps(steps, shares, true);
   if (!updater_mode) steps.Add(QueueingOf(changes), [&changes] { QueueChanges(changes); });
   steps.Run();
@@ -193,10 +189,10 @@ void FolderDelete(const Json::Value& path_list) {
   for (const std::shared_ptr<Folder>& change : removed) {
     if (folder_mgr.IsShareIndexed(change->GetShare()) && IsShareKnown(change->GetShare())) to_compare.push_back(change);
   }
-  steps.Add("save the folders", [&folder_mgr] { folder_mgr.Save(); });
+  AddSaveStep(steps, folder_mgr);
   AddNotifySteps(steps, shares, false);
   steps.Add(QueueingOf(to_compare), [&to_compare] { QueueChanges(to_compare); });
-  if (folder_mgr.GetFolders().empty()) steps.Add("stop the services", [] { SetupRelatedServices(false); });
+  AddStopStep(steps, folder_mgr);
   steps.Run();
 }
 

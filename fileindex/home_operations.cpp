@@ -100,7 +100,7 @@ void UserRename(const std::string& user_from, const std::string& user_to) {
         folder->GetPath().c_str());
   }
   OperationSteps steps(__func__);
-  steps.Add("save the folders", [&] { folder_mgr.Save(); });
+  AddSaveStep(steps, folder_mgr);
   steps.Add("queue the rename of " + user_from,
             [&] { AddCustomEvent(EVENT_RENAME, GetFullPath(home_to), GetFullPath(home_from), Json::Value()); });
   steps.Run();

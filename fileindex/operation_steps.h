@@ -6,6 +6,8 @@
 
 namespace ferrox::fileindex {
 
+class FolderMgr;
+
 /// The steps of a management operation, in the order in which they are carried out.
 class OperationSteps {
  public:
@@ -29,5 +31,14 @@ class OperationSteps {
   const char* operation_;
   std::vector<Step> steps_;
 };
+
+// Steps that several operations take. What is passed must live until the steps are run.
+
+/// FolderMgr::Save.
+void AddSaveStep(OperationSteps& steps, const FolderMgr& folder_mgr);
+/// UpsertKOVANotifydCfg.
+void AddWatchStep(OperationSteps& steps, const std::string& share, const FolderMgr& folder_mgr);
+/// SetupRelatedServices(false), when no folder is left.
+void AddStopStep(OperationSteps& steps, const FolderMgr& folder_mgr);
 
 }  // namespace ferrox::fileindex

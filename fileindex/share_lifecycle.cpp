@@ -39,21 +39,10 @@ bool LiesOnVolume(const Folder& folder, const std::string& mount_point) {
   return false;
 }
 
-void AddSaveStep(OperationSteps& steps, const FolderMgr& folder_mgr) {
-  steps.Add("save the folders", [&folder_mgr] { folder_mgr.Save(); });
-}
-
 void AddPauseSteps(OperationSteps& steps, const std::string& share) {
   steps.Add("stop the worker of " + share, [&share] { DeleteWorker(share); });
   steps.Add("stop watching " + share, [&share] { DeleteKOVANotifydCfg(share); });
   steps.Add("pause the index of " + share, [&share] { elastic::ShareIndexPause(share); });
-}
-
-/// The services are not needed when the last folder has gone.
-void AddLastFolderStep(OperationSteps& steps, const FolderMgr& folder_mgr) {
-  steps.Add("stop the services", [&folder_mgr] {
-    if (folder_mgr.GetFolders().empty()) SetupRelatedServices(false);
-  });
 }
 
 /// The share's folder as it was called before the rename: the last component of its path is its name.
@@ -111,7 +100,7 @@ void ShareResume(const std::string& share_name) {
   if (!folder_mgr.IsShareIndexed(share_name)) return;
   OperationSteps steps(__func__);
   steps.Add("resume the index of " + share_name, [&] { elastic::ShareIndexResume(share_name); });
-  steps.Add("watch the folders of " + share_name, [&] { UpsertKOVANotifydCfg(share_name, folder_mgr); });
+  AddWatchStep(steps, share_name, folder_mgr);
   steps.Add("start the worker of " + share_name, [&] { CreateWorker(share_name); });
   SetPausedOfShare(folder_mgr, share_name, false);
   AddSaveStep(steps, folder_mgr);
@@ -127,7 +116,7 @@ void ShareClearPaused(const std::string& share_name, const std::string& share_pa
   steps.Add("delete the index of " + share_name, [&] { DeleteShareIndex(share_name); });
   folder_mgr.DeleteByShare(share_name);
   AddSaveStep(steps, folder_mgr);
-  AddLastFolderStep(steps, folder_mgr);
+  AddStopStep(steps, folder_mgr);
   steps.Run();
 }
 
@@ -168,7 +157,7 @@ void VolumeResume(const std::string& mount_point) {
   for (const std::string& share : shares) {
     steps.Add("resume the index of " + share, [&share] { elastic::ShareIndexResume(share); });
     steps.Add("start the worker of " + share, [&share] { CreateWorker(share); });
-    steps.Add("watch the folders of " + share, [&] { UpsertKOVANotifydCfg(share, folder_mgr); });
+    AddWatchStep(steps, share, folder_mgr);
   }
   steps.Run();
 }
@@ -187,7 +176,7 @@ void VolumeClearPaused(const std::string& mount_point) {
     steps.Add("clear the status of " + share, [&] { status_mgr->ClearShareStatus(share); });
   }
   AddSaveStep(steps, folder_mgr);
-  AddLastFolderStep(steps, folder_mgr);
+  AddStopStep(steps, folder_mgr);
   steps.Run();
 }
 
