@@ -107,7 +107,7 @@ bool ChangeFile(const Key& key, Change change) {
   Json::Value present;
   const std::string problem = ReadFile(path, present);
   if (!problem.empty()) return Refuse(KOVA_ERR_BAD_CONFIGURATION, problem);
-  return change(path, present) || RefuseBySystem("cannot change the registration " + path, errno);
+  return change(path, !present.isNull()) || RefuseBySystem("cannot change the registration " + path, errno);
 }
 
 }  // namespace
@@ -152,8 +152,9 @@ bool MonitorQueue::Upsert(const MonitorQueue& queue, const std::string& applicat
   problem = KeyProblem(key);
   if (problem.empty() && text.size() > kFileMaxBytes) problem = "the registration of " + key.queue + " is too large";
   if (!problem.empty()) return Refuse(KOVA_ERR_BAD_PARAMETER, problem);
-  return ChangeFile(key, [&](const std::string& path, const Json::Value& present) {
-    if (!present.isNull() && ToText(present) == text) return true;
+  std::string present;
+  if (ReadTextFile(key.File(), present).empty() && present == text) return true;
+  return ChangeFile(key, [&](const std::string& path, bool) {
     return MakeFolders(RegistryFolder(), 0755) && ReplaceFile(path, text, 0644);
   });
 }
@@ -161,8 +162,7 @@ bool MonitorQueue::Upsert(const MonitorQueue& queue, const std::string& applicat
 bool MonitorQueue::Delete(const std::string& queue_path, const std::string& application, int type) {
   const Key key = {queue_path, application, type};
   if (!KeyProblem(key).empty()) return true;  // nobody can have registered it
-  return ChangeFile(
-      key, [](const std::string& path, const Json::Value& present) { return present.isNull() || RemoveFile(path); });
+  return ChangeFile(key, [](const std::string& path, bool is_there) { return !is_there || RemoveFile(path); });
 }
 
 }  // namespace KOVA::KOVANOTIFYD

@@ -3,6 +3,7 @@
 #include <sys/stat.h>
 #include <syslog.h>
 
+#include <algorithm>
 #include <chrono>
 #include <climits>
 #include <cstdlib>
@@ -94,13 +95,19 @@ SeenFile Look(const std::string& path) {
 class Source {
  public:
   std::shared_ptr<const std::vector<ShareEntry>> Get() {
-    const auto configuration = GetConfiguration();
     const std::lock_guard<std::mutex> guard(mutex_);
+    const auto now = SteadyClock::now();
+    if (now < look_at_) return answer_;
+    look_at_ = now + kLookEvery;
+    const auto configuration = GetConfiguration();
     if (!configuration->problem.empty()) return answer_;
     const bool asked_anew = configuration != configuration_;
     configuration_ = configuration;
-    if (!configuration->samba.shares) answer_.reset();
-    if (configuration->samba.shares && IsDue(asked_anew)) Ask(configuration->samba);
+    if (!configuration->samba.shares) {
+      answer_.reset();
+    } else if (asked_anew || (failed_ && now >= retry_at_) || HasChanged()) {
+      Ask(configuration->samba);
+    }
     return answer_;
   }
 
@@ -110,15 +117,9 @@ class Source {
   }
 
  private:
-  bool IsDue(bool asked_anew) {
-    const auto now = SteadyClock::now();
-    if (!asked_anew && now < look_at_) return false;
-    look_at_ = now + kLookEvery;
-    if (asked_anew || (failed_ && now >= retry_at_)) return true;
-    for (const SeenFile& file : files_) {
-      if (!SameFile(Look(file.path).info, file.info)) return true;
-    }
-    return false;
+  bool HasChanged() const {
+    return std::any_of(files_.begin(), files_.end(),
+                       [](const SeenFile& file) { return !SameFile(Look(file.path).info, file.info); });
   }
 
   /// The files are looked at first: what changes while testparm runs is seen the next time.

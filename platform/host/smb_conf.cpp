@@ -1,6 +1,7 @@
 #include "platform/host/smb_conf.h"
 
 #include <algorithm>
+#include <iterator>
 #include <unordered_set>
 #include <utility>
 
@@ -9,6 +10,7 @@ namespace kova::host {
 namespace {
 
 constexpr char kGlobal[] = "global";
+constexpr char kNoSection[] = "\n";  // the name of none: a name has no line feed
 
 bool IsBlank(char c) { return c == ' ' || (c >= '\t' && c <= '\r'); }
 
@@ -102,7 +104,7 @@ size_t SmbConf::FindBefore(size_t end, char wanted, size_t begin) const {
 /// Takes the header at `begin`. What follows a header without its "]" belongs to no section.
 size_t SmbConf::TakeHeader(size_t begin) {
   const size_t end = LogicalEnd(begin), close = FindBefore(end, ']', begin);
-  section_.clear();
+  section_ = kNoSection;
   if (close == end) return end;
   const std::string name = Squeeze(text_.substr(begin + 1, close - begin - 1));
   const size_t next = std::min(text_.find('\n', close), text_.size());
@@ -121,7 +123,7 @@ size_t SmbConf::TakeParameter(size_t begin) {
   while (value_begin < value_end && IsBlank(text_[value_begin])) ++value_begin;
   const std::string name = FoldParameter(text_.substr(begin, equals - begin));
   const std::string value = Squeeze(text_.substr(value_begin, end - value_begin));
-  values_[ValueKey(section_, name)] = value;
+  values_[ValueKey(section_, name)].push_back(lines_.size());
   lines_.push_back({section_, name, value, indent_begin, begin, value_begin, value_end, end});
   return end;
 }
@@ -129,10 +131,15 @@ size_t SmbConf::TakeParameter(size_t begin) {
 bool SmbConf::HasSection(const std::string& section) const { return headers_.count(Fold(section)) != 0; }
 
 std::optional<std::string> SmbConf::Get(const std::string& section, const std::string& parameter) const {
-  const std::string name = FoldParameter(parameter);
-  auto found = values_.find(ValueKey(Fold(section), name));
-  if (found == values_.end()) found = values_.find(ValueKey(kGlobal, name));
-  return found == values_.end() ? std::nullopt : std::optional<std::string>(found->second);
+  const std::string name = FoldParameter(parameter), folded = Fold(section);
+  const auto own = values_.find(ValueKey(folded, name));
+  if (own != values_.end()) return lines_[own->second.back()].value;
+  const auto global = values_.find(ValueKey(kGlobal, name));
+  const auto header = headers_.find(folded);
+  if (global == values_.end() || header == headers_.end()) return {};
+  const auto above = std::lower_bound(global->second.begin(), global->second.end(), header->second);
+  if (above == global->second.begin()) return {};
+  return lines_[*std::prev(above)].value;
 }
 
 bool SmbConf::IsOn(const std::string& section, const std::string& parameter) const {

@@ -21,7 +21,7 @@ class SmbConf {
   const std::vector<std::string>& Sections() const { return sections_; }
   bool HasSection(const std::string& section) const;
 
-  /// The value that holds in a section; nothing when neither it nor "global" has one.
+  /// The value that holds in a section; nothing when neither it nor "global" above it has one.
   std::optional<std::string> Get(const std::string& section, const std::string& parameter) const;
   bool IsOn(const std::string& section, const std::string& parameter) const;
   /// Each value that a parameter has anywhere.
@@ -56,8 +56,9 @@ class SmbConf {
   std::string section_ = "global";  ///< where the next parameter belongs
   std::vector<Line> lines_;
   std::vector<std::string> sections_;
-  std::unordered_map<std::string, size_t> headers_;      ///< a section's first header in lines_
-  std::unordered_map<std::string, std::string> values_;  ///< by section, a line feed and the parameter
+  std::unordered_map<std::string, size_t> headers_;  ///< a section's first header in lines_
+  /// The lines of a parameter in a section, by section, a line feed and the parameter.
+  std::unordered_map<std::string, std::vector<size_t>> values_;
 };
 
 }  // namespace kova::host

@@ -36,7 +36,7 @@ TEST(SmbConfTest, ValuesAreReadAsSambaReadsThem) {
       "[ Photo   Album ] rest\n\tpath = \"/srv/Photo Album\" \n  Spot Light = off\n no value here\n"
       "[two\\\n lines]\r\n comment = one \\\r\n   two   three\\\n\n spotlight = 0\r\n"
       "[PHOTO album]\n hide unreadable = oN\n spotlight =\n"
-      "[broken\n spotlight = no\n[last]\npath = /end");
+      "[broken\n spotlight = no\n[last]\npath = /end\n[global]\nspotlight = 0\nlate = 1\n[later]\n");
   const struct {
     const char *section, *parameter, *value;
   } rows[] = {
@@ -51,11 +51,14 @@ TEST(SmbConfTest, ValuesAreReadAsSambaReadsThem) {
       {"two lines", "spotlight", "0"},
       {"last", "spotlight", "TRUE"},
       {"last", "path", "/end"},
+      {"last", "late", "-"},
+      {"later", "late", "1"},
+      {"later", "spotlight", "0"},
       {"no such", "path", "-"},
   };
   for (const auto& row : rows)
     EXPECT_EQ(row.value, conf.Get(row.section, row.parameter).value_or("-")) << row.parameter;
-  EXPECT_EQ((std::vector<string>{"Global", "Photo Album", "two lines", "last"}), conf.Sections());
+  EXPECT_EQ((std::vector<string>{"Global", "Photo Album", "two lines", "last", "later"}), conf.Sections());
 }
 
 TEST(SmbConfTest, ASwitchChangesItsValueAndNothingElse) {
@@ -94,6 +97,7 @@ class HostSambaTest : public testing::Test {
  protected:
   void SetUp() override {
     for (const char* folder : {"/etc/kova", "/etc/samba"}) std::filesystem::remove_all(TestRoot() + folder);
+    kova::host::ExpectSambaChange();
     LogLines().clear();
     kova::host::SetLogSink([](int, const char* line) { LogLines().emplace_back(line); });
     for (const char* name : {"photo", "music"}) kova::host::AddShare({name, Folder(name)});
@@ -110,6 +114,7 @@ class HostSambaTest : public testing::Test {
   }
   static void Configure(const string& members) {
     WriteFile(TestRoot() + "/etc/kova/kova.json", "{\"samba\": {" + members + "}}");
+    kova::host::ExpectSambaChange();
   }
   /// A program that runs `script` as a shell does.
   string Program(const string& name, const string& script) {
