@@ -5,6 +5,7 @@
 #include <algorithm>
 #include <cerrno>
 #include <cstring>
+#include <stdexcept>
 #include <string>
 
 #include <json/value.h>
@@ -39,13 +40,24 @@ struct Head {
   bool cut = false;
 };
 
-/// Reads the beginning of a file. Returns the reason when it cannot be read, or an empty text.
-std::string ReadHead(const std::string& path, uint64_t expected_bytes, Head& head) {
+/// Whether another file has taken the place of the one that was examined. There are file systems on which the numbers
+/// of an open file are always others than those of its path.
+bool IsReplaced(const std::string& path, const struct stat& opened, const struct statx& examined) {
+  struct stat now = {};
+  return opened.st_ino != examined.stx_ino && (lstat(path.c_str(), &now) != 0 || now.st_ino != examined.stx_ino);
+}
+
+/// Reads the beginning of the file that was examined. Returns the reason when it cannot be read, or an empty text.
+/// @throws std::runtime_error when it is no longer at the path: a document that calls it unreadable, or that has the
+/// content of another, would be taken for true where it has gone.
+std::string ReadHead(const std::string& path, const struct statx& examined, Head& head) {
   const host::Fd file(OpenForReading(path));
+  if (!file.Valid() && (errno == ENOENT || errno == ENOTDIR)) throw std::runtime_error(path + " is gone");
   struct stat info = {};
   if (!file.Valid() || fstat(file.Get(), &info) != 0) return strerror(errno);
+  if (IsReplaced(path, info, examined)) throw std::runtime_error(path + " is another file now");
   if (!S_ISREG(info.st_mode)) return "not a regular file";
-  size_t wanted = static_cast<size_t>(std::min<uint64_t>(expected_bytes, kReadMaxBytes)) + 1;
+  size_t wanted = static_cast<size_t>(std::min<uint64_t>(examined.stx_size, kReadMaxBytes)) + 1;
   size_t have = 0;
   for (;;) {
     head.bytes.resize(wanted);
@@ -92,7 +104,7 @@ std::string AddText(const Head& head, Reader reader, Json::Value& document) {
 /// Returns the reason when there is no text to get, or an empty text.
 std::string AddContent(const std::string& path, const Facts& facts, const ContentType* by_name, Json::Value& document) {
   Head head;
-  const std::string problem = ReadHead(path, facts.info.stx_size, head);
+  const std::string problem = ReadHead(path, facts.info, head);
   if (!problem.empty() || head.bytes.empty()) return problem;
   const ContentType* type = by_name != nullptr ? by_name : TypeByMark(head.bytes);
   const Reader reader = type != nullptr ? type->reader : Reader::kPlain;
