@@ -36,6 +36,7 @@ using std::chrono::seconds;
 /// The queue is looked at again after so long, whether or not it was seen to change.
 constexpr seconds kSlowTimer(30);
 constexpr seconds kSlowTimerWithoutWatch(2);
+constexpr milliseconds kRenamePoll(200);
 constexpr int kClearedByReindex = StatusMgr::kNeedReindex | StatusMgr::kSecondCondition;
 
 bool HasContent(const std::string& path) {
@@ -139,7 +140,7 @@ milliseconds ShareWorker::Round() {
     told_no_space_ = false;
     if (AwaitsRename()) {
       status_.SetState(ShareStatus::State::kStarting, "the index is that of an earlier name or place of the share");
-      return milliseconds(500);
+      return kRenamePoll;
     }
     status_.SetState(ShareStatus::State::kIdle);
     return watch_.SeesChanges() ? kSlowTimer : kSlowTimerWithoutWatch;
@@ -208,6 +209,7 @@ milliseconds ShareWorker::NextDelay(milliseconds first, milliseconds last) {
 
 void ShareWorker::RunOnce() {
   CheckShare();
+  (void)LoadFolders();  // the status tells how many there are
   EnsureIndex();
   const std::string detached = queue_path_ + ".tmp";
   do {
@@ -255,16 +257,14 @@ void ShareWorker::MakeMissingIndex() {
 }
 
 /// Whether documents have paths of before the share was renamed or moved, although the queue is empty: the event that
-/// tells of it is yet to come. If it does not, the share is marked.
+/// tells of it is yet to come. If it does not, a reindex puts the index right.
 bool ShareWorker::AwaitsRename() {
   if (strays_looked_for_) return false;
   strays_looked_for_ = FindStray(*index_, root_).empty();
   if (strays_looked_for_) return false;
   const auto now = std::chrono::steady_clock::now();
   if (!strays_since_) strays_since_ = now;
-  if (now - *strays_since_ >= environment_.rename_patience) {
-    StatusMgr().SetShareStatus(share_, StatusMgr::kNeedReindex);
-  }
+  if (now - *strays_since_ >= environment_.rename_patience) (void)QueueReindex();
   return true;
 }
 
@@ -326,8 +326,16 @@ ShareFolders ShareWorker::LoadFolders() {
 /// The library queues nothing below a path whose reindex it sees in the queue, although the folders of this pass may be
 /// those of before the change. The mark is on the disk before the queue is gone.
 void ShareWorker::QueueAgainIfChanged(const OperationRunner& runner, const ShareFolders& folders) {
-  if (!runner.HadReindex() || LoadFolders() == folders) return;
+  if (!runner.HadReindex() || AreStill(folders)) return;
   StatusMgr().SetShareStatus(share_, StatusMgr::kNeedReindex);
+}
+
+bool ShareWorker::AreStill(const ShareFolders& folders) {
+  try {
+    return LoadFolders() == folders;
+  } catch (const Error&) {
+    return false;  // what cannot be told counts as changed
+  }
 }
 
 Json::Value ShareWorker::Status() {

@@ -92,6 +92,7 @@ class ShareWorker {
   void RunPass();
   void RunOperations(fileindex::QueueMgr& queue, OperationRunner& runner, const ShareFolders& folders);
   ShareFolders LoadFolders();
+  bool AreStill(const ShareFolders& folders);
   void QueueAgainIfChanged(const OperationRunner& runner, const ShareFolders& folders);
 
   std::string share_;
