@@ -96,4 +96,10 @@ Json::Value ShareName(const std::string& name) {
   return data;
 }
 
+void NotifySettingChanged(const std::string& share) {
+  Json::Value data = ShareName(share);
+  data["is_upsert"] = true;
+  (void)AskIndexDaemonIfRunning("notify_setting_changed", data);
+}
+
 }  // namespace ferrox::cli

@@ -19,6 +19,9 @@ Json::Value AskIndexDaemonIfRunning(const std::string& type, const Json::Value& 
 void RequireEngine();
 void RequireIndexDaemon();
 
+/// Has the index daemon, if it runs, look again at what it is to do for a share.
+void NotifySettingChanged(const std::string& share);
+
 /// {"share_name": name}: the data of the index daemon's commands.
 Json::Value ShareName(const std::string& name);
 

@@ -56,9 +56,7 @@ void QueueReindex(const Share& share) {
   } catch (const Error& error) {
     if (error.Code() != Error::kMalformedEvent && error.Code() != Error::kBadArgument) throw;
   }
-  Json::Value changed = ShareName(share.name);
-  changed["is_upsert"] = true;
-  (void)AskIndexDaemonIfRunning("notify_setting_changed", changed);
+  NotifySettingChanged(share.name);
 }
 
 Json::Value ShareStatusOf(const std::string& name) {

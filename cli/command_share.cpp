@@ -5,12 +5,12 @@
 #include "cli/command_table.h"
 #include "cli/configuration_change.h"
 #include "cli/escape.h"
+#include "cli/own_share.h"
 #include "common/error.h"
 #include "common/file_util.h"
 #include "fileindex/elastic/elastic_control.h"
 #include "fileindex/folder_mgr.h"
 #include "fileindex/index_mgr.h"
-#include "platform/host/share_table.h"
 #include "sdk/share.h"
 
 namespace ferrox::cli {
@@ -49,6 +49,7 @@ void DropRemains(const std::string& name, const std::string& queue_path) {
 }
 
 void RemoveShare(const std::string& name) {
+  (void)OwnShare(name, "remove");
   const std::string queue_path = sdk::SDKShare(name).GetQueuePath();
   RequireEngine();
   const Json::Value folders = FoldersOf(name);

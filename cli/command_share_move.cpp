@@ -12,6 +12,9 @@
 #include "cli/escape.h"
 #include "cli/explain.h"
 #include "cli/folder_path.h"
+#include "cli/format.h"
+#include "cli/own_share.h"
+#include "common/clock.h"
 #include "common/error.h"
 #include "common/file_util.h"
 #include "common/log.h"
@@ -21,7 +24,6 @@
 #include "fileindex/optree.h"
 #include "fileindex/status_mgr.h"
 #include "fileindex/util.h"
-#include "platform/host/share_table.h"
 #include "sdk/share.h"
 
 /// A share gets another name or another folder. The table of shares goes first, since the library asks it where the
@@ -31,6 +33,9 @@ namespace ferrox::cli {
 namespace {
 
 using kova::host::ShareEntry;
+
+constexpr int kWorkerLooks = 15;
+constexpr std::chrono::milliseconds kWorkerPause(200);
 
 struct Move {
   std::string old_name;
@@ -42,19 +47,6 @@ struct Move {
 bool Exists(const std::string& path) {
   struct stat status = {};
   return lstat(path.c_str(), &status) == 0;
-}
-
-bool IsShare(const std::string& name) {
-  const std::vector<std::string> shares = sdk::SDKShare::Enum();
-  return std::find(shares.begin(), shares.end(), name) != shares.end();
-}
-
-/// The share's entry in the instance's own table, if it is there.
-std::vector<ShareEntry> OwnEntry(const std::string& name) {
-  std::vector<ShareEntry> entries = kova::host::ListShares();
-  entries.erase(std::remove_if(entries.begin(), entries.end(), [&](const ShareEntry& e) { return e.name != name; }),
-                entries.end());
-  return entries;
 }
 
 std::string QueueOf(const std::string& share_path) {
@@ -85,6 +77,17 @@ void RefuseSharesBelow(const ShareEntry& entry) {
       throw Failure("share " + other.name + " lies in share " + entry.name +
                     "; remove it first ('fileindexctl share remove " + other.name + "'), and add it again afterwards");
     }
+  }
+}
+
+/// Moves the share in the table while nothing works on it: its worker would take the folder for deleted.
+void MoveInTable(const std::string& share, const std::function<void()>& move) {
+  (void)AskIndexDaemonIfRunning("worker_delete", ShareName(share));
+  try {
+    move();
+  } catch (const std::exception&) {
+    NotifySettingChanged(share);  // it goes on as before
+    throw;
   }
 }
 
@@ -130,13 +133,28 @@ void RenameIndex(const Move& move) {
   fileindex::StatusMgr().ClearShareStatus(move.old_name);
 }
 
-/// Registers the new place and starts the share's worker there. A daemon that does not run looks when it starts.
-void GoOn(const std::string& share) {
-  const bool runs = !AskIndexDaemonIfRunning("status", Json::Value()).isNull();
+bool HasWorkerAt(const Json::Value& daemon, const Move& move) {
+  for (const Json::Value& share : daemon["shares"]) {
+    if (TextOf(share, "share") == move.new_name && TextOf(share, "path") == move.new_path) return true;
+  }
+  return false;
+}
+
+/// Registers the new place and has the share's worker go on there. A daemon that does not run looks when it starts; one
+/// that runs may have asked Samba for its shares a moment ago, and then knows the new place only in a second.
+void GoOn(const Move& move) {
+  Json::Value daemon = AskIndexDaemonIfRunning("status", Json::Value());
   try {
-    fileindex::ShareResume(share);
+    fileindex::ShareResume(move.new_name);
   } catch (const Error& error) {
-    if (runs || error.Code() != Error::kInternal) throw;
+    if (!daemon.isNull() || error.Code() != Error::kInternal) throw;
+  }
+  if (!fileindex::FolderMgr().IsShareIndexed(move.new_name)) return;
+  for (int i = 0; i < kWorkerLooks && !daemon.isNull(); ++i) {
+    daemon = AskIndexDaemonIfRunning("status", Json::Value());
+    if (HasWorkerAt(daemon, move)) return;
+    Clock::Get().SleepFor(kWorkerPause);
+    NotifySettingChanged(move.new_name);
   }
 }
 
@@ -149,7 +167,7 @@ void Follow(const Move& move, void (*move_index)(const Move& move), const std::s
     (void)KOVA::KOVANOTIFYD::MonitorQueue::Delete(old_queue, "fileindex",
                                                   KOVA::KOVANOTIFYD::MONITOR_QUEUE_TYPE_APPLICATION);
     move_index(move);
-    if (!paused) GoOn(move.new_name);
+    if (!paused) GoOn(move);
     (void)Unlink(old_queue);
     (void)Unlink(old_queue + ".tmp");
   } catch (const Error& error) {
@@ -174,27 +192,20 @@ bool HasRemains(const Move& move) {
          Exists(queue + ".tmp") || IsPaused(move.new_name) || HasDocumentsBelow(move.new_name, move.old_path);
 }
 
-/// Has the share renamed where it is kept, unless that was done before.
-Move RenameShare(const std::string& from, const std::string& to) {
-  const std::vector<ShareEntry> own = OwnEntry(from);
-  if (own.empty()) {
-    if (IsShare(from)) {
-      throw Failure("share " + from +
-                    " is kept by the file-sharing service; rename it there, then run this command again");
-    }
-    const std::string path = IsShare(to) ? sdk::SDKShare(to).GetPath() : "";
-    const Move move = {from, to, Dirname(path) + "/" + from, path};
-    if (path.empty() || !HasRemains(move)) {
-      throw Failure("there is no share \"" + from + "\"; 'fileindexctl share list' shows them");
-    }
-    return move;
-  }
-  const Move move = {from, to, own[0].path, Dirname(own[0].path) + "/" + to};
+/// What was renamed before, by Samba or by a run that was interrupted: the share has its new name.
+Move RenamedBefore(const std::string& from, const std::string& to) {
+  const std::string path = sdk::SDKShare(to).GetPath();
+  const Move move = {from, to, Dirname(path) + "/" + from, path};
+  if (!HasRemains(move)) throw Error(Error::kNoSuchShare, from);
+  return move;
+}
+
+Move RenameHere(const std::string& from, const std::string& to) {
+  const ShareEntry own = OwnShare(from, "rename");
   if (IsShare(to)) throw Failure("there is a share \"" + to + "\" already; choose another name");
-  RefuseSharesBelow(own[0]);
-  // Else the worker would take the folder for deleted.
-  (void)AskIndexDaemonIfRunning("worker_delete", ShareName(from));
-  RenameInTable(move);
+  RefuseSharesBelow(own);
+  const Move move = {from, to, own.path, Dirname(own.path) + "/" + to};
+  MoveInTable(from, [&] { RenameInTable(move); });
   return move;
 }
 
@@ -208,7 +219,7 @@ int RunShareRename(const Arguments& arguments) {
     throw UsageError("\"" + to + "\" cannot be a share's name: give the last part of the path");
   }
   RequireEngine();
-  const Move move = RenameShare(from, to);
+  const Move move = !IsShare(from) && IsShare(to) ? RenamedBefore(from, to) : RenameHere(from, to);
   const bool indexed = HasRemains(move) || fileindex::FolderMgr().IsShareIndexed(to);
   if (indexed) Follow(move, &RenameIndex, "fileindexctl share rename " + from + " " + to);
   (void)printf("share %s is now %s: %s%s\n", EscapeForTerminal(from).c_str(), EscapeForTerminal(to).c_str(),
@@ -223,15 +234,12 @@ int RunShareMigrate(const Arguments& arguments) {
   const Move move = {name, name, arguments.Has("--from") ? AbsolutePath(arguments.Get("--from")) : here, new_path};
   const std::string again = "fileindexctl share migrate " + name + " " + new_path + " --from " + move.old_path;
   if (move.old_path == new_path) {
-    throw Failure("share " + name + " is at " + new_path +
-                  " already; --from with its old folder finishes a migration that was interrupted");
+    throw Failure("share " + name + " is at " + new_path + " already; tell with --from where it was");
   }
   RequireEngine();
   if (here != new_path) {
-    const std::vector<ShareEntry> own = OwnEntry(name);
-    if (!own.empty()) RefuseSharesBelow(own[0]);
-    (void)AskIndexDaemonIfRunning("worker_delete", ShareName(name));
-    kova::host::MoveShare(name, new_path);
+    RefuseSharesBelow(OwnShare(name, "move"));
+    MoveInTable(name, [&] { kova::host::MoveShare(name, new_path); });
   }
   Follow(
       move, [](const Move& moved) { fileindex::ShareMigrate(moved.new_name, moved.old_path, moved.new_path); }, again);

@@ -130,7 +130,7 @@ CommandGroup Shares() {
                true},
               {"share migrate",
                "SHARE NEW_FOLDER",
-               {{"--from", "FOLDER", "where it was, to finish a migration that was interrupted"}},
+               {{"--from", "FOLDER", "where it was, of a share of Samba or to finish an interrupted run"}},
                "Tells that a share's folder has been moved, for example to another volume; its index follows.",
                &RunShareMigrate,
                true},

@@ -20,6 +20,7 @@ struct Remedy {
   const char* text;
 };
 constexpr Remedy kRemedies[] = {
+    {Error::kShareEnumFailed, "'fileindexctl share list' says what is wrong with the table of shares"},
     {Error::kCredentialsFailed, "try again as root, or as the owner of the instance"},
     {Error::kLoadFailed, "correct the file, or move it away to start without it"},
     {Error::kSaveFailed, "see that its folder can be written and has space"},

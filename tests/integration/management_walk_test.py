@@ -188,6 +188,7 @@ class ManagementWalkTest(unittest.TestCase):
         os.symlink("trip", f"{photo}/link")
         write(f"{photo}/file.txt", "")
         os.rmdir(gone)
+        os.mkdir(f"{self.vol}/taken")
         self.ctl("folder", "add", "/photo/trip")
         rows = [
             (901, "folder set", ["folder", "add", "/photo/trip/"]),
@@ -208,6 +209,7 @@ class ManagementWalkTest(unittest.TestCase):
             (None, "not paused", ["share", "forget", "photo"]),
             (None, "already", ["share", "rename", "photo", "photos"]),
             (None, "no share", ["share", "rename", "nonexistent", "photo"]),
+            (None, "exists already", ["share", "rename", "photo", "taken"]),
             (None, "not there", ["share", "rename", "gone", "here"]),
             (None, "already", ["share", "migrate", "photo", photo]),
             (None, "", ["share", "migrate", "photo", f"{self.vol}/nowhere"]),
@@ -217,6 +219,7 @@ class ManagementWalkTest(unittest.TestCase):
         for code, text, words in rows:
             with self.subTest(words=words):
                 self.expect_refused(code, *words, text=text)
+        self.assertEqual(["photo"], [share["share"] for share in self.instance.status()["index_daemon"]["shares"]])
         self.assertIn(b"no indexed folder", self.ctl("volume", "pause", f"{self.vol}/pho"))
         for number in range(1000):
             os.makedirs(f"{photo}/many/{number}")
@@ -278,6 +281,33 @@ class ManagementWalkTest(unittest.TestCase):
             self.ctl("folder", "add", *(f"/docs/d{number}" for number in missing))
         self.ctl("index", "docs", "--wait")
         self.expect_documents("docs", docs, *(f"{docs}/d{number}" for number in range(40)))
+
+    def test_share_that_samba_renames_and_moves(self):
+        testparm, sections = f"{self.instance.root}/testparm", f"{self.instance.root}/etc/samba/smb.conf"
+        write(testparm, f"#!/bin/sh\ncat {sections}\n")
+        os.chmod(testparm, 0o755)
+        write(f"{self.instance.root}/etc/kova/kova.json", json.dumps({"samba": {"shares": True, "testparm": testparm}}))
+        pets, animals = f"{self.vol}/pets", f"{self.vol}2/animals"
+        write(f"{pets}/cat.txt", "lynx")
+        write(sections, f"[pets]\n\tpath = {pets}\n\tread only = No\n")
+        self.ctl("up")
+        self.ctl("folder", "add", "/pets")
+        self.expect_documents("pets", pets, pets)
+        for verb in (["remove", "pets"], ["rename", "pets", "animals"], ["migrate", "pets", f"{self.vol}2/pets"]):
+            os.makedirs(f"{self.vol}2/pets", exist_ok=True)
+            self.expect_refused(None, "share", *verb, text="kept by the file-sharing service")
+        os.rmdir(f"{self.vol}2/pets")
+
+        os.rename(pets, f"{self.vol}/animals")
+        write(sections, f"[animals]\n\tpath = {self.vol}/animals\n\tread only = No\n")
+        self.ctl("share", "rename", "pets", "animals")
+        self.expect_documents("animals", f"{self.vol}/animals", f"{self.vol}/animals")
+        os.rename(f"{self.vol}/animals", animals)
+        write(sections, f"[animals]\n\tpath = {animals}\n\tread only = No\n")
+        self.expect_refused(None, "share", "migrate", "animals", animals, text="--from")
+        self.ctl("share", "migrate", "animals", animals, "--from", f"{self.vol}/animals")
+        self.expect_documents("animals", animals, animals)
+        self.expect_found("lynx", f"{animals}/cat.txt")
 
     def test_interrupted_rename_is_finished_by_the_same_command(self):
         self.ctl("up")

@@ -17,8 +17,7 @@ HEADER_LEVELS = {"optree": 0, "util": 0, "queue_mgr": 1, "status_mgr": 1, "elast
 EXCEPTIONS = {("fileindex/custom_event.cpp", "fileindex/queue_mgr.h"),
               ("fileindex/custom_event.cpp", "fileindex/status_mgr.h"),
               ("fileindex/queue_mgr.cpp", "fileindex/folder_mgr.h"),
-              ("cli/command_share.cpp", "platform/host/share_table.h"),
-              ("cli/command_share_move.cpp", "platform/host/share_table.h"),
+              ("cli/own_share.h", "platform/host/share_table.h"),
               ("services/fileindexd/main.cpp", "platform/host/share_table.h"),
               ("cli/command_service.cpp", "platform/host/child_service.h")}
 
