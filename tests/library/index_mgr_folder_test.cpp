@@ -153,7 +153,7 @@ TEST_F(IndexMgrTest, DeleteIsAllOrNone) {
             "index_delete fileindex_gone; status null; saved; " + Told("gone", "false"))
       << "an entry whose share is gone can be deleted";
   EXPECT_EQ(Stored(), "/photo dp; ");
-  platform_.failing["KOVAShareGet"] = {};
+  platform_.failing["KOVAShareGet"] = {KOVA_ERR_SYSTEM, 1};
   EXPECT_EQ(Does(&FolderDelete, List({"/photo"})), "throws 800 photo") << "a failure is no absence";
 }
 

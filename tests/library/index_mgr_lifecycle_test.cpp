@@ -123,10 +123,10 @@ TEST_F(IndexMgrTest, RecycleBins) {
 }
 
 TEST_F(IndexMgrTest, RenameOfAUser) {
-  Store("/homes/alice/docs; /homes/alicia; /homes/alice; /photo/homes/alice");
+  Store("/homes/alice/docs; /homes/alice2; /homes/alice; /photo/homes/alice");
   EXPECT_EQ(Does(&UserRename, "alice", "bob"),
             "saved; queue homes: rename /volume1/homes/alice -> /volume1/homes/bob; ");
-  EXPECT_EQ(Stored(), "/homes/bob/docs dp; /homes/alicia dp; /homes/bob dp; /photo/homes/alice dp; ");
+  EXPECT_EQ(Stored(), "/homes/bob/docs dp; /homes/alice2 dp; /homes/bob dp; /photo/homes/alice dp; ");
   EXPECT_TRUE(log_.Contains(" Update homes rule: [/homes/alice/docs] -> [/homes/bob/docs]"));
   EXPECT_EQ(Does(&UserRename, "carol", "dave"), "queue homes: rename /volume1/homes/carol -> /volume1/homes/dave; ");
 }
