@@ -18,6 +18,7 @@
 #include <kova/share.h>
 #include <kova/user.h>
 
+#include "platform/host/account_source.h"
 #include "platform/host/share_table.h"
 #include "tests/contract/in_child.h"
 #include "tests/support/temp_dir.h"
@@ -163,6 +164,16 @@ TEST_F(HostPlatformTest, ConcurrentChangesAreAllKept) {
   }
   for (std::thread& thread : threads) thread.join();
   EXPECT_EQ(40U, ListShares().size());
+}
+
+TEST_F(HostPlatformTest, AccountsOfTheNetworkAreToldApart) {
+  using kova::host::NetworkSource;
+  const string winbind = "group: files sss\npasswd:\tfiles winbind # sss\n", both = "passwd: files sss winbind\n";
+  EXPECT_EQ(AUTH_DOMAIN, NetworkSource("ann", winbind));
+  EXPECT_EQ(AUTH_LDAP, NetworkSource("ann", both));
+  EXPECT_EQ(AUTH_LDAP, NetworkSource("ann", ""));
+  EXPECT_EQ(AUTH_DOMAIN, NetworkSource("OFFICE\\ann", both));
+  EXPECT_EQ(AUTH_DOMAIN, NetworkSource("ann@office", both));
 }
 
 TEST_F(HostPlatformTest, PrivilegesFollowModeBits) {

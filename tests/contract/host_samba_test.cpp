@@ -4,7 +4,6 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
-#include <algorithm>
 #include <filesystem>
 #include <string>
 #include <vector>
@@ -16,10 +15,10 @@
 #include <kova/samba.h>
 #include <kova/share.h>
 
-#include "platform/host/log.h"
 #include "platform/host/samba_shares.h"
 #include "platform/host/share_table.h"
 #include "platform/host/smb_conf.h"
+#include "tests/contract/host_log.h"
 #include "tests/contract/in_child.h"
 #include "tests/support/temp_dir.h"
 
@@ -88,29 +87,17 @@ TEST(SmbConfTest, ASwitchChangesItsValueAndNothingElse) {
     EXPECT_EQ(row.after, SmbConf(row.before).WithSwitch({"a", "B", "a"}, "spotlight", row.on));
 }
 
-std::vector<string>& LogLines() {
-  static std::vector<string> lines;
-  return lines;
-}
-
 class HostSambaTest : public testing::Test {
  protected:
   void SetUp() override {
     for (const char* folder : {"/etc/kova", "/etc/samba"}) std::filesystem::remove_all(TestRoot() + folder);
     kova::host::ExpectSambaChange();
-    LogLines().clear();
-    kova::host::SetLogSink([](int, const char* line) { LogLines().emplace_back(line); });
     for (const char* name : {"photo", "music"}) kova::host::AddShare({name, Folder(name)});
   }
-  void TearDown() override { kova::host::SetLogSink(nullptr); }
 
   string Folder(const string& path) {
     std::filesystem::create_directories(dir_ / path);
     return dir_ / path;
-  }
-  static long Logged(const string& text) {
-    return std::count_if(LogLines().begin(), LogLines().end(),
-                         [&](const string& line) { return line.find(text) != string::npos; });
   }
   static void Configure(const string& members) {
     WriteFile(TestRoot() + "/etc/kova/kova.json", "{\"samba\": {" + members + "}}");
@@ -131,6 +118,7 @@ class HostSambaTest : public testing::Test {
 
   const string conf_ = TestRoot() + "/etc/samba/smb.conf";
   TempDir dir_;
+  HostLog log_;
 };
 
 TEST_F(HostSambaTest, WithoutAnythingToSwitchSpotlightIsNotSupported) {
@@ -139,7 +127,7 @@ TEST_F(HostSambaTest, WithoutAnythingToSwitchSpotlightIsNotSupported) {
     EXPECT_LT(KOVASMBSetSpotlight(1), 0);
     EXPECT_EQ(KOVA_ERR_NOT_SUPPORTED, KLIBCErrGet());
   }
-  EXPECT_EQ(1, Logged("there is no Samba configuration " + conf_)) << "said once";
+  EXPECT_EQ(1, log_.Count("there is no Samba configuration " + conf_)) << "said once";
   kova::host::AddShare({"homes", Folder("homes")});
   const string text =
       "[global]\nspotlight = yes\n[homes]\n x = 1\ninclude = " + (dir_ / "more") + "\n[print$]\n y = 2\n";
@@ -149,7 +137,7 @@ TEST_F(HostSambaTest, WithoutAnythingToSwitchSpotlightIsNotSupported) {
   EXPECT_LT(KOVASMBSetSpotlight(1), 0);
   EXPECT_EQ(KOVA_ERR_NOT_SUPPORTED, KLIBCErrGet());
   EXPECT_EQ(text, ReadFile(conf_));
-  EXPECT_EQ(1, Logged("the section of share \"music\" is in " + (dir_ / "more")));
+  EXPECT_EQ(1, log_.Count("the section of share \"music\" is in " + (dir_ / "more")));
 }
 
 TEST_F(HostSambaTest, TheFileKeepsItsPlaceItsModeAndItsOwner) {
@@ -264,7 +252,7 @@ TEST_F(HostSambaTest, SharesFollowTheFilesThatTheyComeFrom) {
     kova::host::ExpectSambaChange();
     EXPECT_EQ("abphoto", look_ups()) << "the last good answer";
   }
-  EXPECT_EQ(1, Logged("Samba's shares cannot be read anew"));
+  EXPECT_EQ(1, log_.Count("Samba's shares cannot be read anew"));
   EXPECT_THROW(kova::host::RemoveShare("a"), kova::host::ShareTableError);
   Configure("\"shares\": false");
   EXPECT_EQ("--photo", look_ups());
@@ -282,7 +270,7 @@ TEST_F(HostSambaTest, AShareOfTheTableHidesSambas) {
   ASSERT_EQ(3U, shares.size());
   EXPECT_EQ(dir_ / "photo", shares[1].path);
   EXPECT_TRUE(!shares[1].from_samba && shares[2].from_samba);
-  EXPECT_EQ(1, Logged("share \"photo\" is at " + (dir_ / "photo") + " by "));
+  EXPECT_EQ(1, log_.Count("share \"photo\" is at " + (dir_ / "photo") + " by "));
 }
 
 TEST_F(HostSambaTest, TheRealTestparmIsUnderstood) {
