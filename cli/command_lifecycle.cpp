@@ -7,7 +7,7 @@
 #include "cli/configuration_change.h"
 #include "cli/escape.h"
 #include "cli/folder_path.h"
-#include "common/error.h"
+#include "cli/own_share.h"
 #include "fileindex/folder_mgr.h"
 #include "fileindex/index_mgr.h"
 #include "sdk/share.h"
@@ -52,15 +52,6 @@ int ReportHomes() {
   return kDone;
 }
 
-bool IsKnown(const std::string& share) {
-  try {
-    const sdk::SDKShare known(share);
-    return true;
-  } catch (const Error&) {
-    return false;
-  }
-}
-
 /// The index of a share that is indexed at this moment is not dropped by mistake.
 void RefuseActive(const std::string& share) {
   const FolderMgr configured;
@@ -90,7 +81,7 @@ int RunShareResume(const Arguments& arguments) {
 
 int RunShareForget(const Arguments& arguments) {
   const std::string& name = arguments.words[0];
-  const bool known = IsKnown(name);
+  const bool known = IsShare(name);
   if (!known && arguments.words.size() == 1) {
     throw UsageError("share \"" + name + "\" is gone: also give the folder where it was");
   }

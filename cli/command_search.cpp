@@ -89,6 +89,14 @@ void PrintSummary(const Json::Value& result, uint64_t offset) {
                result["ranking_bounded"].asBool() ? "; so many match that only a part was ranked" : "");
 }
 
+void PrintNothingFound(const Json::Value& result) {
+  std::string similar;
+  for (const Json::Value& word : result["suggestions"]) {
+    if (word.isString()) similar += (similar.empty() ? "; there is: " : ", ") + EscapeForTerminal(word.asString());
+  }
+  (void)fprintf(stderr, "nothing found%s\n", similar.c_str());
+}
+
 }  // namespace
 
 int RunSearch(const Arguments& arguments) {
@@ -102,7 +110,7 @@ int RunSearch(const Arguments& arguments) {
     for (const Json::Value& hit : result["hits"]) PrintHit(hit, on_terminal);
     PrintSummary(result, UintOf(request, "offset"));
   } else {
-    (void)fprintf(stderr, "nothing found\n");
+    PrintNothingFound(result);
   }
   return hits > 0 ? kDone : kNothingFound;
 }

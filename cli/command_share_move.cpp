@@ -161,6 +161,8 @@ void GoOn(const Move& move) {
 /// What comes once the platform has the share at its new place. The lines of the old queue are superseded by the event
 /// of the move, which has both places compared with the index.
 void Follow(const Move& move, void (*move_index)(const Move& move), const std::string& again) {
+  const std::string rest =
+      "the share is at " + move.new_path + " now, but its index does not follow yet: run '" + again + "' to finish";
   try {
     const bool paused = IsPaused(move.old_name) || IsPaused(move.new_name);
     const std::string old_queue = QueueOf(move.old_path);
@@ -171,8 +173,9 @@ void Follow(const Move& move, void (*move_index)(const Move& move), const std::s
     (void)Unlink(old_queue);
     (void)Unlink(old_queue + ".tmp");
   } catch (const Error& error) {
-    throw Failure(Explain(error, "the share is at " + move.new_path + " now, but its index does not follow yet: run '" +
-                                     again + "' to finish"));
+    throw Failure(Explain(error, rest));
+  } catch (const Failure& failure) {
+    throw Failure(std::string(failure.what()) + "; " + rest);
   }
 }
 

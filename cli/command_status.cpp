@@ -4,6 +4,7 @@
 #include "cli/ask.h"
 #include "cli/command_table.h"
 #include "cli/escape.h"
+#include "cli/explain.h"
 #include "cli/format.h"
 #include "cli/progress.h"
 #include "common/clock.h"
@@ -77,8 +78,9 @@ std::string PauseText(const Json::Value& status) {
   return until == 0 ? ", paused until 'fileindexctl resume'" : ", paused until " + Date(until);
 }
 
-/// The shares with indexed folders that nothing works on: {"share", "folders", "paused"} each.
-Json::Value RestingShares(const Json::Value& daemon) {
+/// The shares with indexed folders that nothing works on: {"share", "folders", "paused"} each. Where the list of
+/// folders cannot be read, that is a `problem`: the rest is worth showing all the more.
+Json::Value RestingShares(const Json::Value& daemon, std::string& problem) try {
   std::map<std::string, Json::Value> shares;
   const fileindex::FolderMgr configured;
   for (const auto& folder : configured.GetFolders()) {
@@ -93,6 +95,9 @@ Json::Value RestingShares(const Json::Value& daemon) {
   Json::Value list(Json::arrayValue);
   for (const auto& [name, share] : shares) list.append(share);
   return list;
+} catch (const Error& error) {
+  problem = Explain(error);
+  return Json::Value(Json::arrayValue);
 }
 
 /// The engine's "ping" reply, or null when it does not run.
@@ -104,28 +109,37 @@ Json::Value EngineState() {
   }
 }
 
+constexpr char kStopped[] = "does not run; start it with 'fileindexctl up'";
+
+std::string EngineText(const Json::Value& engine) {
+  return engine.isNull() ? kStopped : "runs, process " + std::to_string(IntOf(engine, "pid"));
+}
+
+std::string DaemonText(const Json::Value& daemon, bool needed) {
+  if (daemon.isNull()) return needed ? kStopped : "does not run; it starts with the first indexed folder";
+  return "runs, process " + std::to_string(IntOf(daemon, "pid")) + ", " + std::to_string(UintOf(daemon, "workers")) +
+         " workers" + PauseText(daemon);
+}
+
 }  // namespace
 
 int RunStatus(const Arguments& arguments) {
   const Json::Value engine = EngineState();
   const Json::Value daemon = AskIndexDaemonIfRunning("status", Json::Value());
-  const Json::Value resting = RestingShares(daemon);
+  std::string problem;
+  const Json::Value resting = RestingShares(daemon, problem);
   if (arguments.Has("--json")) {
     Json::Value json;
     json["engine"] = engine;
     json["index_daemon"] = daemon;
     json["resting_shares"] = resting;
+    if (!problem.empty()) json["problem"] = problem;
     (void)printf("%s\n", ToScriptJson(json).c_str());
     return kDone;
   }
-  const char* stopped = "does not run; start it with 'fileindexctl up'";
-  (void)printf("search engine: %s\n",
-               engine.isNull() ? stopped : ("runs, process " + std::to_string(IntOf(engine, "pid"))).c_str());
-  (void)printf("index daemon: %s\n", daemon.isNull()
-                                         ? stopped
-                                         : ("runs, process " + std::to_string(IntOf(daemon, "pid")) + ", " +
-                                            std::to_string(UintOf(daemon, "workers")) + " workers" + PauseText(daemon))
-                                               .c_str());
+  (void)printf("search engine: %s\n", EngineText(engine).c_str());
+  (void)printf("index daemon: %s\n", DaemonText(daemon, !resting.empty() || !problem.empty()).c_str());
+  if (!problem.empty()) (void)printf("indexed folders: %s\n", EscapeForTerminal(problem).c_str());
   if (!daemon.isNull()) {
     for (const Json::Value& share : daemon["shares"]) PrintShare(share);
   }

@@ -3,10 +3,10 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
-#include <algorithm>
 #include <vector>
 
 #include "cli/command.h"
+#include "cli/own_share.h"
 #include "common/error.h"
 #include "common/file_util.h"
 #include "fileindex/folder_mgr.h"
@@ -46,9 +46,8 @@ std::string SharePathOnDisk(const std::string& path) {
 
 /// The full path of a share path; "" when there is no such share.
 std::string FullPathInShare(const std::string& share_path) {
-  const std::vector<std::string> shares = sdk::SDKShare::Enum();
   const std::string name = share_path.substr(1, share_path.find('/', 1) - 1);
-  if (std::find(shares.begin(), shares.end(), name) == shares.end()) return {};
+  if (!IsShare(name)) return {};
   return sdk::SDKShare(name).GetPath() + share_path.substr(1 + name.size());
 }
 

@@ -76,6 +76,16 @@ class ToolTest(unittest.TestCase):
         self.assertIn("/photos/a b\n    document, photo, \"n\"\n", shown)
         self.assertEqual(3, len(re.findall("document, photo", shown)))
 
+    def test_damaged_list_is_named_and_hides_nothing_else(self):
+        with open(f"{self.root}/var/packages/Ferrox/etc/fileindex.folders", "w", encoding="utf-8") as file:
+            file.write("[{")
+        for words in (["folder", "list"], ["folder", "get", "/photo/trip"], ["index", "photo"]):
+            done = self.run_tool(*words)
+            self.assertEqual(3, done.returncode)
+            self.assertIn(b"fileindex.folders; correct the file, or move it away", done.stderr)
+        status = json.loads(self.run_tool("status", "--json").stdout)
+        self.assertIn("(error 504)", status["problem"])
+
     def test_usage_is_checked_before_anything_is_done(self):
         rows = [("--kinds takes", ["folder", "add", "--kinds", "music", "/photo"]),
                 ("--kinds is needed", ["folder", "set", "/photo"]), ("--name goes with one", ["folder", "add", "/photo",

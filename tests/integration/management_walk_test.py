@@ -150,6 +150,15 @@ class ManagementWalkTest(unittest.TestCase):
         self.ctl("user", "rename", "anna", "carla")
         self.expect_documents("homes", homes, f"{homes}/carla", f"{homes}/annabel/notes")
         self.expect_found("capybara", f"{homes}/carla/notes/diary.txt", f"{homes}/annabel/notes/diary.txt")
+        write(f"{homes}/carla/#recycle/old.txt", "capybara in the bin")
+        self.instance.queue(homes, event(CREATE, f"{homes}/carla/#recycle/old.txt"))
+        for words in (["home", "enable"], ["home", "disable", "--accounts", "ldap"], ["share", "check-recycle", "homes"],
+                      ["folder", "reindex", "/homes/carla"], ["prepare"]):
+            self.ctl(*words)
+        self.instance.wait_idle("homes", homes)
+        self.expect_found("capybara", f"{homes}/carla/notes/diary.txt", f"{homes}/annabel/notes/diary.txt")
+        self.ctl("suggest-refresh", "homes")
+        self.assertIn(b"capybara", self.instance.run("search", "--share", "homes", "capybaar").stderr)
 
     def delete_all(self, papers):
         self.ctl("folder", "delete", "/papers/letters")
@@ -227,7 +236,7 @@ class ManagementWalkTest(unittest.TestCase):
         self.expect_refused(900, "folder", "add", *(f"/photo/many/{number}" for number in range(1000)))
         self.assertLess(time.monotonic() - begin, 5)
         os.mkdir(f"{self.instance.root}/var/packages/Ferrox/etc/fileindex.folders.new")  # stops root's writing, too
-        self.expect_refused(505, "folder", "add", "/photo/other", text="cannot write")
+        self.expect_refused(505, "folder", "add", "/photo/other", text="not done: save the folders; tell the index daemon")
 
     def test_daemons_that_do_not_run(self):
         docs = self.share_without_folders("docs")
