@@ -20,6 +20,7 @@ bool IsAtOrBelow(const std::string& path, const std::string& folder) {
 void DocumentMover::Move(const std::string& path, const std::string& old_path) {
   if (IsAtOrBelow(path, old_path) || IsAtOrBelow(old_path, path)) return;
   for (const std::string& top : IndexedTopsOf(path)) {
+    interruption_.Check();
     const std::string old_top = old_path + top.substr(path.size());
     if (!HoldsDocumentsOf(old_top, top)) continue;
     writer_.WillChange();

@@ -4,6 +4,7 @@
 #include <vector>
 
 #include "services/fileindexd/document_writer.h"
+#include "services/fileindexd/interruption.h"
 #include "services/fileindexd/path_rules.h"
 #include "services/fileindexd/share_folders.h"
 #include "services/fileindexd/share_index.h"
@@ -18,10 +19,11 @@ class DocumentMover {
  public:
   /// All outlive it; `root` is the share's folder.
   DocumentMover(const std::string& root, ShareIndex& index, const ShareFolders& folders, PathRules& rules,
-                DocumentWriter& writer)
-      : root_(root), index_(index), folders_(folders), rules_(rules), writer_(writer) {}
+                DocumentWriter& writer, const Interruption& interruption)
+      : root_(root), index_(index), folders_(folders), rules_(rules), writer_(writer), interruption_(interruption) {}
 
   /// Follows the rename of `old_path`, which lay outside the present root when the share itself was renamed or moved.
+  /// @throws Interrupted; Error.
   void Move(const std::string& path, const std::string& old_path);
 
  private:
@@ -34,6 +36,7 @@ class DocumentMover {
   const ShareFolders& folders_;
   PathRules& rules_;
   DocumentWriter& writer_;
+  const Interruption& interruption_;
 };
 
 }  // namespace ferrox::indexd

@@ -47,7 +47,7 @@ OperationRunner::OperationRunner(const PassContext& context)
     : context_(context),
       rules_(context.share, context.root, context.folders),
       writer_(context.index, context.folders, context.status),
-      mover_(context_.root, context.index, context.folders, rules_, writer_),
+      mover_(context_.root, context.index, context.folders, rules_, writer_, context.interruption),
       tasks_(context.pool, context.interruption) {}
 
 void OperationRunner::Run(const std::function<void(const std::function<void(const fileindex::OP&)>&)>& each,

@@ -14,6 +14,7 @@ ShareFolders ShareFolders::Load(const std::string& share, const std::string& roo
   for (const auto& folder : folder_mgr.GetFolders()) {
     const std::string& path = folder->GetPath();
     if (!StringStartWith(path + "/", "/" + share + "/")) continue;
+    loaded.any_paused_ = loaded.any_paused_ || folder->IsPaused();
     // Of a path that stands twice, the first counts.
     (void)loaded.kinds_.emplace(root + path.substr(1 + share.size()),
                                 Kinds{folder->IsDocument(), folder->IsAudio(), folder->IsVideo(), folder->IsPhoto()});

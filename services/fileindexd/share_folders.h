@@ -27,8 +27,12 @@ class ShareFolders {
   /// @throws Error kLoadFailed; kBadArgument; kNoSuchShare; kInternal.
   static ShareFolders Load(const std::string& share, const std::string& root);
 
-  bool operator==(const ShareFolders& other) const = default;
+  /// Whether the same is indexed, paused or not.
+  bool operator==(const ShareFolders& other) const {
+    return kinds_ == other.kinds_ && recycle_bin_ == other.recycle_bin_;
+  }
   size_t Count() const { return kinds_.size(); }
+  bool AnyPaused() const { return any_paused_; }
 
   Place PlaceOf(std::string_view full_path) const;
   /// Whether the content of a file there is read: its kind is on, or it is of none of the four kinds.
@@ -44,6 +48,7 @@ class ShareFolders {
   /// The kinds under which the path lies; null when it is under no folder.
   const Kinds* Governing(std::string_view full_path) const;
 
+  bool any_paused_ = false;
   bool recycle_bin_ = false;
   std::map<std::string, Kinds, std::less<>> kinds_;  ///< by full path
 };

@@ -55,6 +55,7 @@ class Engine : public ShareIndex {
     elastic::ShareIndexCreate(share_);
   }
 
+  void Resume() override { elastic::ShareIndexResume(share_); }
   void Upsert(const std::string& path, bool need_meta) override { elastic::IndexUpsert(share_, path, need_meta); }
   void Attr(const std::string& path) override { elastic::IndexAttr(share_, path); }
   void Delete(const std::string& path) override { elastic::IndexDel(share_, path); }

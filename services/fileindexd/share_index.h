@@ -25,6 +25,8 @@ class ShareIndex {
   virtual bool Exists() = 0;
   /// Makes it when it is missing; replaces one of the same name that lies elsewhere.
   virtual void Create() = 0;
+  /// Ends a pause of the index.
+  virtual void Resume() = 0;
   virtual void Upsert(const std::string& path, bool need_meta) = 0;
   virtual void Attr(const std::string& path) = 0;
   virtual void Delete(const std::string& path) = 0;

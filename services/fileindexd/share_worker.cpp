@@ -97,14 +97,14 @@ ShareWorker::ShareWorker(const std::string& share, const Environment& environmen
       index_(environment.open_index(share)),
       watch_({queue_path_}) {}
 
-ShareWorker::~ShareWorker() {
+void ShareWorker::Start() {
+  thread_ = std::thread([this] { Loop(); });
+}
+
+void ShareWorker::Stop() {
   stopping_ = true;
   Wake();
   if (thread_.joinable()) thread_.join();
-}
-
-void ShareWorker::Start() {
-  thread_ = std::thread([this] { Loop(); });
 }
 
 void ShareWorker::Wake() {
@@ -159,9 +159,11 @@ milliseconds ShareWorker::Round() {
 }
 
 milliseconds ShareWorker::OnFailure(const Error& error) {
-  if (std::exchange(last_failure_, error.Code()) != error.Code()) delay_ = milliseconds(0);
+  if (std::exchange(last_failure_, error.Code()) != error.Code()) {
+    delay_ = milliseconds(0);
+    failing_since_ = std::chrono::steady_clock::now();
+  }
   index_exists_ = index_exists_ && error.Code() != Error::kEngineNoSuchIndex;
-  if (error.Code() != Error::kEngineNoSuchIndex) index_missing_since_.reset();
   try {
     if (IsOutOfSpace(error, share_)) return OnNoSpace(error);
   } catch (const Error&) {
@@ -172,11 +174,7 @@ milliseconds ShareWorker::OnFailure(const Error& error) {
                      "the search engine does not answer; start it with 'fileindexctl up'");
     return NextDelay(seconds(1), seconds(30));
   }
-  if (error.Code() == Error::kEngineIndexPaused) {
-    status_.SetState(ShareStatus::State::kPaused,
-                     "the share's index is paused; 'fileindexctl share resume' resumes it");
-    return NextDelay(milliseconds(500), seconds(30));
-  }
+  if (error.Code() == Error::kEngineIndexPaused) return OnIndexPaused();
   if (error.Code() == Error::kEngineNoSuchIndex) {
     status_.SetState(ShareStatus::State::kWaitingForEngine, error.what());
     return NextDelay(milliseconds(500), seconds(2));
@@ -200,6 +198,22 @@ milliseconds ShareWorker::OnNoSpace(const Error& error) {
     }
   }
   return NextDelay(seconds(10), seconds(300));
+}
+
+/// Where no folder of the share is paused, those that were have been removed, or a pause was not finished.
+milliseconds ShareWorker::OnIndexPaused() {
+  status_.SetState(ShareStatus::State::kPaused, "the share's index is paused; 'fileindexctl share resume' resumes it");
+  try {
+    if (HasFailedTooLong(Error::kEngineIndexPaused) && !LoadFolders().AnyPaused()) index_->Resume();
+  } catch (const Error&) {
+    // Tried again when the pause is met again.
+  }
+  return NextDelay(milliseconds(500), seconds(10));
+}
+
+bool ShareWorker::HasFailedTooLong(int code) const {
+  const auto since = last_failure_ == code ? failing_since_ : std::chrono::steady_clock::now();
+  return std::chrono::steady_clock::now() - since >= environment_.patience;
 }
 
 milliseconds ShareWorker::NextDelay(milliseconds first, milliseconds last) {
@@ -234,13 +248,10 @@ void ShareWorker::CheckShare() {
 void ShareWorker::EnsureIndex() {
   if (index_exists_) return;
   if (!index_->Exists()) {
-    const auto now = std::chrono::steady_clock::now();
-    if (!index_missing_since_) index_missing_since_ = now;
-    FERROX_FAIL_IF(now - *index_missing_since_ < environment_.rename_patience, Error::kEngineNoSuchIndex,
+    FERROX_FAIL_IF(!HasFailedTooLong(Error::kEngineNoSuchIndex), Error::kEngineNoSuchIndex,
                    "the share has no index yet");
     MakeMissingIndex();
   }
-  index_missing_since_.reset();
   index_exists_ = true;
 }
 
@@ -264,7 +275,7 @@ bool ShareWorker::AwaitsRename() {
   if (strays_looked_for_) return false;
   const auto now = std::chrono::steady_clock::now();
   if (!strays_since_) strays_since_ = now;
-  if (now - *strays_since_ >= environment_.rename_patience) (void)QueueReindex();
+  if (now - *strays_since_ >= environment_.patience) (void)QueueReindex();
   return true;
 }
 

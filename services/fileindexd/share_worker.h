@@ -50,20 +50,22 @@ class ShareWorker {
     std::function<std::unique_ptr<ShareIndex>(const std::string& share)> open_index = &EngineShareIndex;
     /// A queue that has just changed is left for so long, since changes seldom come alone.
     std::chrono::milliseconds gather_time{100};
-    /// While a share is renamed, its index is missing for a moment, and then the event that tells of it. Longer than
-    /// this, they are lost.
-    std::chrono::milliseconds rename_patience = std::chrono::seconds(5);
+    /// While an operation goes on, an index may be missing or paused for a moment, or the event that tells of a rename.
+    /// What takes longer than this was not finished.
+    std::chrono::milliseconds patience = std::chrono::seconds(5);
   };
 
   /// @throws Error kNoSuchShare; kInternal.
   ShareWorker(const std::string& share, const Environment& environment);
   ShareWorker(const ShareWorker&) = delete;
   ShareWorker& operator=(const ShareWorker&) = delete;
-  /// Stops the work where it is; the queue stays as it is and is taken up again by the next worker.
-  ~ShareWorker();
+  ~ShareWorker() { Stop(); }
 
   /// Begins to work in a thread.
   void Start();
+  /// Ends the work where it is, for good; the queue stays as it is and is taken up again by the next worker. Returns
+  /// when the thread has ended. Like Start, for one thread at a time.
+  void Stop();
   /// Looks again at the pause, the queue and the share's settings at once.
   void Wake();
 
@@ -81,6 +83,8 @@ class ShareWorker {
   std::chrono::milliseconds Round();
   std::chrono::milliseconds OnFailure(const Error& error);
   std::chrono::milliseconds OnNoSpace(const Error& error);
+  std::chrono::milliseconds OnIndexPaused();
+  bool HasFailedTooLong(int code) const;
   std::chrono::milliseconds NextDelay(std::chrono::milliseconds first, std::chrono::milliseconds last);
 
   void CheckShare();
@@ -101,13 +105,13 @@ class ShareWorker {
   Environment environment_;
   std::unique_ptr<ShareIndex> index_;
   bool index_exists_ = false;
-  std::optional<std::chrono::steady_clock::time_point> index_missing_since_;
   bool strays_looked_for_ = false;
   std::optional<std::chrono::steady_clock::time_point> strays_since_;
   std::optional<ShareFolders> last_folders_;  ///< what the last finished pass went by
   std::atomic<uint64_t> folder_count_{0};
   int last_failure_ = 0;
-  std::chrono::milliseconds delay_{0};  ///< grows while the same failure comes again
+  std::chrono::steady_clock::time_point failing_since_;  ///< with that failure
+  std::chrono::milliseconds delay_{0};                   ///< grows while the same failure comes again
   bool told_no_space_ = false;
   ShareStatus status_;
   FileWatch watch_;

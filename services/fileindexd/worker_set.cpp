@@ -2,8 +2,6 @@
 
 #include <syslog.h>
 
-#include <algorithm>
-#include <iterator>
 #include <set>
 #include <vector>
 
@@ -21,7 +19,7 @@ void WorkerSet::Reconcile() {
 
 void WorkerSet::Create(const std::string& share) {
   const std::lock_guard lock(mutex_);
-  workers_.erase(share);
+  End(share);
   commanded_[share] = Command::kCreate;
   ReconcileLocked();
 }
@@ -29,7 +27,7 @@ void WorkerSet::Create(const std::string& share) {
 void WorkerSet::Delete(const std::string& share) {
   const std::lock_guard lock(mutex_);
   commanded_[share] = Command::kDelete;
-  workers_.erase(share);
+  End(share);
 }
 
 void WorkerSet::SettingChanged(const std::string& share) {
@@ -45,11 +43,22 @@ void WorkerSet::WakeAll() {
   for (const auto& [share, worker] : workers_) worker->Wake();
 }
 
+/// The engine, which is asked for each worker, may be slow; commands do not wait for it.
 Json::Value WorkerSet::Status() const {
+  std::unique_lock lock(mutex_);
+  const auto workers = workers_;
+  lock.unlock();
   Json::Value shares(Json::arrayValue);
-  const std::lock_guard lock(mutex_);
-  for (const auto& [share, worker] : workers_) shares.append(worker->Status());
+  for (const auto& [share, worker] : workers) shares.append(worker->Status());
   return shares;
+}
+
+/// Somebody may be asking the worker for its status, so that it is not gone when it is out of the set.
+void WorkerSet::End(const std::string& share) {
+  const auto worker = workers_.find(share);
+  if (worker == workers_.end()) return;
+  worker->second->Stop();
+  workers_.erase(worker);
 }
 
 std::map<std::string, WorkerSet::IndexedShare> WorkerSet::IndexedShares() {
@@ -71,17 +80,17 @@ std::map<std::string, WorkerSet::IndexedShare> WorkerSet::IndexedShares() {
 
 void WorkerSet::ReconcileLocked() {
   const std::map<std::string, IndexedShare> indexed_shares = IndexedShares();
-  const auto is_gone = [&indexed_shares](const auto& item) { return indexed_shares.count(item.first) == 0; };
-  std::erase_if(commanded_, is_gone);
-  std::erase_if(workers_, is_gone);
+  std::erase_if(commanded_, [&](const auto& item) { return indexed_shares.count(item.first) == 0; });
+  const auto workers = workers_;
+  for (const auto& [share, worker] : workers) {
+    const auto indexed = indexed_shares.find(share);
+    const bool usable = indexed != indexed_shares.end() && indexed->second.root == worker->Root();
+    if (!usable || !Wants(share, indexed->second)) End(share);
+  }
   for (const auto& [share, indexed] : indexed_shares) {
-    const auto worker = workers_.find(share);
-    const bool usable = worker != workers_.end() && worker->second->Root() == indexed.root;
-    const bool wanted = Wants(share, indexed);
-    if (worker != workers_.end() && !(wanted && usable)) workers_.erase(worker);
-    if (!wanted || usable) continue;
+    if (workers_.count(share) != 0 || !Wants(share, indexed)) continue;
     try {
-      auto made = make_(share);
+      std::shared_ptr<ShareWorker> made = make_(share);
       made->Start();
       workers_[share] = std::move(made);
     } catch (const Error& error) {

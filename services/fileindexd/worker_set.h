@@ -5,6 +5,7 @@
 #include <memory>
 #include <mutex>
 #include <string>
+#include <utility>
 
 #include <json/value.h>
 
@@ -22,6 +23,8 @@ class WorkerSet {
 
   /// `make` is called with the name of a share that exists; the set starts what it returns.
   explicit WorkerSet(MakeWorker make) : make_(std::move(make)) {}
+  WorkerSet(const WorkerSet&) = delete;
+  WorkerSet& operator=(const WorkerSet&) = delete;
 
   /// Makes and ends workers so that they are those of the present folders and shares. One whose share lies elsewhere
   /// now is made anew. @throws Error when the folders or shares cannot be told; nothing is changed then.
@@ -48,12 +51,13 @@ class WorkerSet {
   static std::map<std::string, IndexedShare> IndexedShares();
 
   void ReconcileLocked();
+  void End(const std::string& share);
   bool Wants(const std::string& share, const IndexedShare& indexed);
 
   MakeWorker make_;
   mutable std::mutex mutex_;  ///< held while workers are made and stopped, so that commands keep their order
   std::map<std::string, Command> commanded_;
-  std::map<std::string, std::unique_ptr<ShareWorker>> workers_;
+  std::map<std::string, std::shared_ptr<ShareWorker>> workers_;  ///< shared with those who ask for its status
 };
 
 }  // namespace ferrox::indexd

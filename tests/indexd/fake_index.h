@@ -2,6 +2,7 @@
 
 #include <sys/stat.h>
 
+#include <atomic>
 #include <functional>
 #include <map>
 #include <mutex>
@@ -26,12 +27,16 @@ class FakeIndex : public indexd::ShareIndex {
     std::string content;  ///< what was read when it was last upserted
   };
 
-  bool Exists() override { return exists; }
+  bool Exists() override {
+    if (paused) throw Error(Error::kEngineIndexPaused, "paused");
+    return exists;
+  }
   void Create() override {
     exists = true;
     ++creations;
   }
 
+  void Resume() override { paused = false; }
   void Upsert(const std::string& path, bool need_meta) override {
     const Document document = {StampOf(path), need_meta, need_meta ? ContentOf(path) : ""};
     const std::lock_guard lock(mutex);
@@ -95,6 +100,7 @@ class FakeIndex : public indexd::ShareIndex {
 
   std::mutex mutex;
   bool exists = true;
+  std::atomic<bool> paused{false};
   std::map<std::string, Document> documents;
   std::map<std::string, int> upserts;
   int creations = 0;

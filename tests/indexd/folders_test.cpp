@@ -1,5 +1,3 @@
-#include <unistd.h>
-
 #include <functional>
 
 #include "fileindex/status_mgr.h"
@@ -41,9 +39,6 @@ class FoldersTest : public WorkerTest {
     size_t count = 0;
     for (const auto& [path, times] : index->upserts) count += static_cast<size_t>(times);
     return count;
-  }
-  void WaitUntilIdle() {
-    for (int i = 0; i < 6000 && worker->Status()["state"] != "idle"; ++i) usleep(10000);
   }
   void StartWith(const Folders& folders) {
     SetFolders(folders);
@@ -174,7 +169,7 @@ TEST_F(FoldersTest, RenamedShareTakesItsDocumentsAlong) {
       worker = MakeWorker();
       if (event != 0) Queue(Line(event, root, old_root));
       worker->Start();
-      WaitUntilIdle();
+      WaitForState("idle");
       EXPECT_EQ(Expected(), Indexed());
       size_t files = 0;
       for (const auto& [path, times] : index->upserts) files += fs::is_directory(path) ? 0 : 1;

@@ -158,6 +158,16 @@ TEST_F(ShareWorkerTest, MissingIndexIsMadeAfterAWhileAndFilled) {
   EXPECT_EQ(Expected(), Indexed());
 }
 
+TEST_F(ShareWorkerTest, PausedIndexIsResumedWhenNoFolderIsPaused) {
+  index->paused = true;
+  Configure(share, {{"", "davp"}}, true);
+  worker->Start();
+  WaitForState("paused");
+  EXPECT_TRUE(index->paused);
+  SetFolders({{"", "davp"}});
+  WaitForState("idle");
+}
+
 TEST_F(ShareWorkerTest, MissingFolderIsNoDeletion) {
   test::WriteFile(At("a"), "1");
   Process(Line(kReindex, root));

@@ -1,5 +1,7 @@
 #pragma once
 
+#include <unistd.h>
+
 #include <filesystem>
 #include <map>
 #include <memory>
@@ -78,7 +80,7 @@ class WorkerTest : public testing::Test {
                                            return fake;
                                          }};
     environment.gather_time = std::chrono::milliseconds(0);
-    environment.rename_patience = patience;
+    environment.patience = patience;
     return std::make_unique<ShareWorker>(share, environment);
   }
 
@@ -96,6 +98,11 @@ class WorkerTest : public testing::Test {
   void Process(const std::string& lines) {
     Queue(lines);
     worker->RunOnce();
+  }
+  /// For a worker that was started.
+  void WaitForState(const std::string& state) {
+    for (int i = 0; i < 6000 && worker->Status()["state"] != state; ++i) usleep(10000);
+    ASSERT_EQ(state, worker->Status()["state"].asString());
   }
   std::string At(const std::string& name) const { return root + "/" + name; }
 
