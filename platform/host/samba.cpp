@@ -90,10 +90,10 @@ void EndSearchWorker(const std::string& config) {
   if (program.empty() || access(program.c_str(), X_OK) != 0) return;
   std::string output;
   if (kova::host::RunForOutput(program, {"-s", config, "samba-dcerpcd", "shutdown"}, output) == 0) return;
-  LogChange(LOG_WARNING, program,
+  LogChange(LOG_INFO, program,
             program +
-                " samba-dcerpcd shutdown failed: a search worker that runs keeps the old "
-                "Spotlight setting until it ends");
+                " samba-dcerpcd shutdown failed, as it does when no search worker runs; one that runs keeps the "
+                "old Spotlight setting until it ends");
 }
 
 bool IsUnchanged(const Reading& reading) {

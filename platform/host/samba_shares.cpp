@@ -5,8 +5,6 @@
 
 #include <algorithm>
 #include <chrono>
-#include <climits>
-#include <cstdlib>
 #include <mutex>
 #include <sstream>
 
@@ -60,8 +58,10 @@ std::string FolderProblem(const ShareEntry& share) {
 bool TakeSection(const SmbConf& conf, const std::string& section, ShareEntry& share, std::string& problem) {
   const auto value = [&](const char* parameter) { return conf.Get(section, parameter).value_or(""); };
   if (conf.IsOn(section, "printable") || SmbConf::Boolean(value("available")) == false) return false;
-  share.name = section;
   share.path = PlainPath(value("path"));
+  // Upper and lower case do not count in Samba's names; here a share is called as its folder.
+  const std::string folder = NameOf(share.path);
+  share.name = SmbConf::Fold(folder) == SmbConf::Fold(section) ? folder : section;
   if (share.path.find('%') != std::string::npos) {
     problem = "its path " + share.path + " differs from user to user";
     return false;
@@ -164,9 +164,9 @@ std::vector<ShareEntry> ParseTestparm(const std::string& output, std::vector<std
     if (IsSpecialSection(section)) continue;
     ShareEntry share;
     std::string problem;
-    if (TakeSection(conf, section, share, problem)) shares.push_back(share);
+    const bool taken = TakeSection(conf, section, share, problem);
+    if (taken) shares.push_back(share);
     if (problem.empty()) continue;
-    const bool taken = !shares.empty() && shares.back().name == section;
     problems.push_back(std::string("Samba's share \"") + section + "\"" + (taken ? ": " : " is left out: ") + problem);
   }
   return shares;

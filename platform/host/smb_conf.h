@@ -10,7 +10,8 @@ namespace kova::host {
 /// The text of a Samba configuration: sections "[name]" of lines "parameter = value"; lines that begin with "#" or ";"
 /// are comments, a "\" at the end of another line continues it. Upper and lower case and the number of blanks do not
 /// count in the names of sections, upper and lower case and blanks at all not in those of parameters. What stands
-/// before the first section belongs to "global", whose values hold for the sections that have none of their own.
+/// before the first section belongs to "global", whose values hold for the sections that begin further down and have
+/// none of their own.
 class SmbConf {
  public:
   explicit SmbConf(std::string text);

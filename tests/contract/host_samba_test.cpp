@@ -189,11 +189,11 @@ TEST_F(HostSambaTest, WhatTestparmTellsBecomesShares) {
   std::vector<string> problems;
   const auto shares = kova::host::ParseTestparm(
       "# Global parameters\n[global]\n\tworkgroup = WG\n\thide unreadable = Yes\n\trecycle:repository = .bin/%U\n" +
-          section("homes", "/h", "\tbrowseable = No\n") + section("video", video, "\tvfs objects = catia recycle\n") +
+          section("homes", "/h", "\tbrowseable = No\n") + section("ViDeo", video, "\tvfs objects = catia recycle\n") +
           section("data", "/gone/data",
                   "\thide unreadable = No\n\tread only = No\n\tvfs objects = recycle:x catia\n"
                   "\trecycle : repository = #recycle\n") +
-          section("Video", video) + section("me", "/srv/%U/me") + section("lp", "/tmp", "\tprintable = Yes\n") +
+          section("me", "/srv/%U/me") + section("lp", "/tmp", "\tprintable = Yes\n") +
           section("off", "/srv/off", "\tavailable = No\n") + section("Data Bank", "\"/gone/Data Bank/\"") +
           section("IPC$", "/tmp") + section("own", "/srv/own", "\tvfs objects = recycle\n\trecycle:repository = %U\n"),
       problems);
@@ -246,9 +246,9 @@ TEST_F(HostSambaTest, SharesFollowTheFilesThatTheyComeFrom) {
   EXPECT_EQ("abphoto", look_ups());
   EXPECT_EQ(3, count_runs()) << "an included file has changed";
 
-  Program("testparm", "exit 1");
-  WriteFile(conf_, shares("b"));
-  for (int i = 0; i < 3; ++i) {
+  for (const char* script : {"exit 1", "exec yes without end"}) {
+    Program("testparm", script);
+    WriteFile(conf_, shares("b") + "#" + script);
     kova::host::ExpectSambaChange();
     EXPECT_EQ("abphoto", look_ups()) << "the last good answer";
   }
