@@ -4,6 +4,7 @@
 #include <algorithm>
 #include <chrono>
 #include <cstdio>
+#include <set>
 
 #include "cli/ask.h"
 #include "cli/command_table.h"
@@ -76,6 +77,11 @@ bool ReindexIsPending(const Share& share, const Json::Value& status) {
   }
 }
 
+[[noreturn]] void ThrowNotWorkedOn(const std::string& share) {
+  if (IsPaused(share)) throw Failure("share " + share + " is paused; 'fileindexctl share resume' goes on with it");
+  throw Failure("the index daemon does not index " + share + "; 'fileindexctl down' and 'up' make it look again");
+}
+
 /// Returns the share's last status.
 Json::Value WaitUntilDone(const Share& share) {
   Progress progress(isatty(STDERR_FILENO) == 1);
@@ -83,9 +89,7 @@ Json::Value WaitUntilDone(const Share& share) {
   std::string told;
   while (true) {
     Json::Value status = ShareStatusOf(share.name);
-    if (status.isNull())
-      throw Failure("the index daemon does not index " + share.name +
-                    "; 'fileindexctl down' and 'up' make it look again");
+    if (status.isNull()) ThrowNotWorkedOn(share.name);
     const std::string state = TextOf(status, "state");
     if (state != "error") last_good = SteadyClock::now();
     if (!ReindexIsPending(share, status)) return ShareStatusOf(share.name);
@@ -133,9 +137,11 @@ int RunSuggestRefresh(const Arguments& arguments) {
   std::vector<std::string> shares = arguments.words;
   for (const std::string& share : shares) RequireIndexed(sdk::SDKShare(share).GetName(), configured);
   if (shares.empty()) {
-    for (const std::string& share : configured.GetIndexedShares()) shares.push_back(share);
+    const std::set<std::string> indexed = configured.GetIndexedShares();
+    shares.assign(indexed.begin(), indexed.end());
   }
   std::vector<std::string> databases;
+  databases.reserve(shares.size());
   for (const std::string& share : shares) databases.push_back(sdk::SDKShare(share).GetDBName());
   RequireEngine();
   fileindex::UpdateTermSuggestion(databases);

@@ -83,7 +83,7 @@ int RunShareForget(const Arguments& arguments) {
   const std::string& name = arguments.words[0];
   const bool known = IsShare(name);
   if (!known && arguments.words.size() == 1) {
-    throw UsageError("share \"" + name + "\" is gone: also give the folder where it was");
+    throw UsageError("share \"" + EscapeForTerminal(name) + "\" is gone: also give the folder where it was");
   }
   if (known) RefuseActive(name);
   const std::string path =

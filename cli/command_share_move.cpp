@@ -9,6 +9,7 @@
 
 #include "cli/ask.h"
 #include "cli/command_table.h"
+#include "cli/configuration_change.h"
 #include "cli/escape.h"
 #include "cli/explain.h"
 #include "cli/folder_path.h"
@@ -62,13 +63,6 @@ bool HasIndex(const std::string& share) {
     if (index["id"].asString() == id) return true;
   }
   return false;
-}
-
-bool IsPaused(const std::string& share) {
-  const fileindex::FolderMgr configured;
-  const auto& folders = configured.GetFolders();
-  return std::any_of(folders.begin(), folders.end(),
-                     [&](const auto& folder) { return folder->IsPaused() && folder->GetShare() == share; });
 }
 
 void RefuseSharesBelow(const ShareEntry& entry) {
@@ -219,7 +213,7 @@ int RunShareRename(const Arguments& arguments) {
   const std::string& to = arguments.words[1];
   if (from == to) throw UsageError("the new name is the old one");
   if (to.empty() || to.find('/') != std::string::npos || to == "." || to == "..") {
-    throw UsageError("\"" + to + "\" cannot be a share's name: give the last part of the path");
+    throw UsageError("\"" + EscapeForTerminal(to) + "\" cannot be a share's name: give the last part of the path");
   }
   RequireEngine();
   const Move move = !IsShare(from) && IsShare(to) ? RenamedBefore(from, to) : RenameHere(from, to);

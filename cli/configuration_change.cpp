@@ -1,5 +1,6 @@
 #include "cli/configuration_change.h"
 
+#include <algorithm>
 #include <cstring>
 
 #include "cli/command.h"
@@ -48,6 +49,13 @@ void ChangeConfiguration(const std::function<void()>& change) {
                   "'fileindexctl index' with the share's name";
     throw Failure(Explain(error, note));
   }
+}
+
+bool IsPaused(const std::string& share) {
+  const fileindex::FolderMgr configured;
+  const auto& folders = configured.GetFolders();
+  return std::any_of(folders.begin(), folders.end(),
+                     [&](const auto& folder) { return folder->IsPaused() && folder->GetShare() == share; });
 }
 
 void RequireIndexed(const std::string& share, const fileindex::FolderMgr& configured) {

@@ -13,6 +13,9 @@ namespace ferrox::cli {
 /// how to finish what follows from it. @throws Failure.
 void ChangeConfiguration(const std::function<void()>& change);
 
+/// Whether a folder of the share is paused.
+bool IsPaused(const std::string& share);
+
 /// @throws Failure when no folder of the share is indexed.
 void RequireIndexed(const std::string& share, const fileindex::FolderMgr& configured);
 

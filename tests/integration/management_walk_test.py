@@ -134,6 +134,7 @@ class ManagementWalkTest(unittest.TestCase):
             self.instance.wait_idle("media", f"{self.vol}/media")
             self.expect_found(word, f"{self.vol}/media/films/{word}.txt")
             self.expect_found("roof")
+            self.expect_refused(None, "index", "papers", "--wait", text="share resume")
             self.ctl(*go)
             self.expect_documents("papers", papers, f"{papers}/letters", f"{papers}/plans")
             self.expect_found(word, new, f"{self.vol}/media/films/{word}.txt")
