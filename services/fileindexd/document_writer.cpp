@@ -77,9 +77,9 @@ void DocumentWriter::Remove(const std::string& path) {
   status_.DocumentDeleted();
 }
 
-void DocumentWriter::RemoveTree(const std::string& path) {
-  Remove(path);
-  index_.DeleteBelow(path);
+void DocumentWriter::RemoveBelow(const std::string& folder) {
+  WillChange();
+  index_.DeleteBelow(folder);
 }
 
 void DocumentWriter::Commit() {

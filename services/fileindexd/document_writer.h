@@ -37,7 +37,8 @@ class DocumentWriter {
   /// the document.
   void RefreshRenamed(const std::string& path, const std::string& old_path);
   void Remove(const std::string& path);
-  void RemoveTree(const std::string& path);
+  /// Removes all below a folder at once.
+  void RemoveBelow(const std::string& folder);
 
   /// Makes all that was done durable. @throws Error.
   void Commit();

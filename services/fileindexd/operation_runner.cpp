@@ -23,6 +23,7 @@ using fileindex::FileIndexOP;
 constexpr auto kCommitInterval = std::chrono::seconds(5);
 /// A comparison that has seen so many files tells how many there are.
 constexpr uint64_t kFilesBeforeCount = 500;
+constexpr unsigned kRemovedAtOnce = 5000;
 
 }  // namespace
 
@@ -105,7 +106,10 @@ void OperationRunner::Commit() {
 void OperationRunner::MoveDelete(const std::string& path, const std::string&) {
   struct stat status = {};
   if (LookAt(path, status) != Presence::kGone) return;
-  tasks_.Submit([this, path] { writer_.RemoveTree(path); });
+  tasks_.Submit([this, path] {
+    writer_.Remove(path);
+    writer_.RemoveBelow(path);
+  });
 }
 
 void OperationRunner::MoveRename(const std::string& path, const std::string& old_path) {
@@ -182,17 +186,35 @@ void OperationRunner::Compare(const std::string& path) {
   tasks_.Wait();
   if (path == context_.root) return CompareRoot();
   if (!StringStartWith(path, context_.root + "/")) return;
-  if (context_.folders.PlaceOf(path) == Place::kOutside) return writer_.RemoveTree(path);
+  if (context_.folders.PlaceOf(path) == Place::kOutside) return RemoveTree(path);
   struct stat status = {};
   const Presence presence = LookAt(path, status);
   if (presence == Presence::kUnknown) {
     return context_.status.AddFailure(std::string("cannot be examined: ") + strerror(errno), path);
   }
   const Place place = rules_.PlaceOf(path);
-  if (presence == Presence::kGone || place == Place::kOutside) return writer_.RemoveTree(path);
+  if (presence == Presence::kGone || place == Place::kOutside) return RemoveTree(path);
   CompareOne(path, place, status);
-  if (!S_ISDIR(status.st_mode)) return context_.index.DeleteBelow(path);
-  CompareFolder(path);
+  S_ISDIR(status.st_mode) ? CompareFolder(path) : RemoveBelow(path);
+}
+
+void OperationRunner::RemoveTree(const std::string& path) {
+  writer_.Remove(path);
+  RemoveBelow(path);
+}
+
+/// What is much is removed page by page: the index removes all at once, but cannot be interrupted then.
+void OperationRunner::RemoveBelow(const std::string& folder) {
+  while (true) {
+    const std::vector<IndexedEntry> page = context_.index.List(folder, "", kRemovedAtOnce);
+    if (page.size() < kRemovedAtOnce) break;
+    for (const IndexedEntry& entry : page) {
+      tasks_.Submit([this, path = entry.path] { writer_.Remove(path); });
+    }
+    tasks_.Wait();
+    CommitIfDue();
+  }
+  writer_.RemoveBelow(folder);
 }
 
 void OperationRunner::CompareRoot() {
@@ -205,7 +227,7 @@ void OperationRunner::RemoveStrays() {
   for (std::string stray; !(stray = FindStray(context_.index, context_.root)).empty();) {
     context_.interruption.Check();
     const std::string folder = FolderOfStrays(stray, context_.root);
-    folder.empty() ? writer_.Remove(stray) : writer_.RemoveTree(folder);
+    folder.empty() ? writer_.Remove(stray) : RemoveTree(folder);
   }
 }
 

@@ -78,6 +78,8 @@ class OperationRunner {
   void Compare(const std::string& path);
   void CompareRoot();
   void RemoveStrays();
+  void RemoveTree(const std::string& path);
+  void RemoveBelow(const std::string& folder);
   void CompareOne(const std::string& path, Place place, const struct stat& status);
   void CompareFolder(const std::string& folder);
   ComparisonActions Actions(const std::string& folder);
