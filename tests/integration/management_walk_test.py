@@ -82,7 +82,7 @@ class ManagementWalkTest(unittest.TestCase):
         def written():
             return self.instance.share_status("docs")["written"]
         before = written()
-        self.ctl("folder", "set", "/docs/letters", "--kinds", "audio,video,photo")
+        self.ctl("folder", "set", "/docs/letters", "--kinds", "audio,video,photo", "--name", "Post")
         self.expect_documents("docs", docs, f"{docs}/letters", f"{docs}/plans")
         self.expect_found("zeppelin", roof, films)
         self.expect_found("name:berta.txt", berta)
@@ -135,11 +135,15 @@ class ManagementWalkTest(unittest.TestCase):
             self.expect_found(word, f"{self.vol}/media/films/{word}.txt")
             self.expect_found("roof")
             self.expect_refused(None, "index", "papers", "--wait", text="share resume")
+            before = self.instance.folders()
+            self.ctl("folder", "set", "/papers/letters", "--kinds", "all")  # stays paused, and called as before
+            self.assertEqual(sorted(map(str, before)), sorted(map(str, self.instance.folders())))
             self.ctl(*go)
             self.expect_documents("papers", papers, f"{papers}/letters", f"{papers}/plans")
             self.expect_found(word, new, f"{self.vol}/media/films/{word}.txt")
             self.expect_found("list", films)
-        self.ctl("folder", "set", "/papers/plans", "--kinds", "all")  # forgets the volume that it was paused with
+        names = {folder["path"]: folder["name"] for folder in self.instance.folders()}
+        self.assertEqual({"/papers/letters": "Post", "/papers/plans": "plans", "/media/films": "films"}, names)
 
     def rename_a_user(self):
         homes = self.share_without_folders("homes")
