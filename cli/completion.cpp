@@ -127,6 +127,7 @@ Words ArgumentWords(const Command& command, const Words& given) {
 }
 
 Words AllCompletions(Words& words) {
+  if (words.size() > 1 && words[words.size() - 2] == "--root") return {":folders"};
   TakeRoot(words);
   if (words.empty()) return {};
   if (words.size() == 1) {
@@ -134,7 +135,6 @@ Words AllCompletions(Words& words) {
     found.insert(found.end(), {"--root", "--help", "--version"});
     return found;
   }
-  if (words[words.size() - 2] == "--root") return {":folders"};
   size_t count = 0;
   const Words typed_before(words.begin(), words.end() - 1);
   const Command* command = FindCommand(typed_before, count);

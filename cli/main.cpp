@@ -59,13 +59,20 @@ void PrepareInstance(bool changes) {
   }
 }
 
+[[noreturn]] void ThrowNoCommand(const std::string& word) {
+  std::string known;
+  for (const std::string& second : Completions({word, ""})) known += (known.empty() ? "" : ", ") + second;
+  if (!known.empty()) throw UsageError(word + " is followed by one of: " + known);
+  throw UsageError("there is no command \"" + EscapeForTerminal(word) + "\"");
+}
+
 int Run(std::vector<std::string> words) {
   if (!words.empty() && words[0] == kCompleteCommand) return PrintCompletions({words.begin() + 1, words.end()});
   if (TakeGlobalOptions(words)) return kDone;
   if (words.empty()) throw UsageError("say what to do");
   size_t name_words = 0;
   const Command* command = FindCommand(words, name_words);
-  if (command == nullptr) throw UsageError("there is no command \"" + words[0] + "\"");
+  if (command == nullptr) ThrowNoCommand(words[0]);
   words.erase(words.begin(), words.begin() + static_cast<std::ptrdiff_t>(name_words));
   try {
     const Arguments arguments = ParseArguments(*command, words);

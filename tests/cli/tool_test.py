@@ -92,7 +92,8 @@ class ToolTest(unittest.TestCase):
                                                                                            "/photos", "--name", "x"]),
                 ("--sort takes one of", ["folder", "list", "--sort", "size"]), ("missing", ["share", "rename", "a"]),
                 ("too many", ["share", "rename", "a", "b", "c"]), ("--accounts takes", ["home", "enable", "--accounts", "x"]),
-                ("cannot be a share's name", ["share", "rename", "photo", "a/b"]), ("no command", ["folder", "nonsense"])]
+                ("cannot be a share's name", ["share", "rename", "photo", "a/b"]), ("add, delete, get", ["folder", "nonsense"]),
+                ("no command", ["nonsense", "add"])]
         for text, words in rows:
             with self.subTest(words=words):
                 done = self.run_tool(*words)
@@ -122,7 +123,7 @@ class ToolTest(unittest.TestCase):
             (["folder", "delete", "/photos"], [":open", "/photos/a b", "/photos"]),
             (["folder", "add", "/photo/tr"], [":open", "/photo/tree", "/photo/trip"]),
             (["share", "add", ""], [":folders"]), (["queue", "show", ""], [":files"]), (["share", "forget", "photo", ""], [":folders"]),
-            (["index", "photo", ""], []), (["nonsense", ""], []),
+            (["--root", self.root[:4]], [":folders"]), (["index", "photo", ""], []), (["nonsense", ""], []),
         ]
         for words, expected in rows:
             with self.subTest(words=words):
