@@ -79,7 +79,7 @@ void FolderUpsert(const Json::Value& folder_list, bool create, bool updater_mode
   steps.Add("start the services", [] { SetupRelatedServices(true); });
   for (const std::string& share : shares) {
     if (create && !before.IsShareIndexed(share)) {
-      steps.Add("create the index of " + share, [&share] { elastic::ShareIndexCreate(share); });
+      steps.Add("create the index of " + share, [&share] { CreateShareIndex(share); });
     }
     AddWatchStep(steps, share, folder_mgr);
   }

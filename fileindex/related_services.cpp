@@ -167,6 +167,17 @@ void CleanShareIndexData(const std::string& share, const std::string& share_path
   newClass<StatusMgr>()->ClearShareStatus(share);
 }
 
+void CreateShareIndex(const std::string& share) {
+  try {
+    return elastic::ShareIndexCreate(share);
+  } catch (const Error& error) {
+    if (error.Code() != Error::kEngineIndexExists) throw;
+    Log(LOG_WARNING, "the index of share [%s] lies elsewhere, it is made anew", share.c_str());
+  }
+  DeleteShareIndex(share);
+  elastic::ShareIndexCreate(share);
+}
+
 void DeleteShareIndex(const std::string& share) {
   try {
     elastic::ShareIndexDelete(share);

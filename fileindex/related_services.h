@@ -28,6 +28,9 @@ void DeleteKOVANotifydCfg(const std::string& share);
 /// @throws Error kInternal when the platform cannot tell where they are, the queues first; as StatusMgr does.
 void CleanShareIndexData(const std::string& share, const std::string& share_path);
 
+/// elastic::ShareIndexCreate for a share that had no folders. An index of that name at another place is left from
+/// before its volume was forgotten.
+void CreateShareIndex(const std::string& share);
 /// elastic::ShareIndexDelete for a share that may have no index any more: an operation that was interrupted behind
 /// this step can be asked for again.
 void DeleteShareIndex(const std::string& share);
