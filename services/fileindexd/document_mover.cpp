@@ -34,10 +34,8 @@ void DocumentMover::Move(const std::string& path, const std::string& old_path) {
 
 /// The paths that have documents, at or below one that was renamed, without those below another of them.
 std::vector<std::string> DocumentMover::IndexedTopsOf(const std::string& path) {
-  const PathRules::Place place = rules_.PlaceOf(path);
-  if (place == PathRules::Place::kOnTheWay) return folders_.TopmostBelow(path);
-  if (place != PathRules::Place::kIndexed) return {};
-  return path == root_ ? EntriesOfRoot() : std::vector<std::string>{path};
+  if (rules_.PlaceOf(path) == PathRules::Place::kOutside) return {};
+  return path == root_ && rules_.CanBeIndexed(path) ? EntriesOfRoot() : folders_.Topmost(path);
 }
 
 /// The root itself has no document that the engine could move with all below it.

@@ -224,10 +224,9 @@ void OperationRunner::CompareRoot() {
 
 /// After the share was renamed or moved, what could not be taken along is left behind under the old name.
 void OperationRunner::RemoveStrays() {
-  for (std::string stray; !(stray = FindStray(context_.index, context_.root)).empty();) {
+  for (std::string stray; !(stray = FindStray(context_.index, {context_.root})).empty();) {
     context_.interruption.Check();
-    const std::string folder = FolderOfStrays(stray, context_.root);
-    folder.empty() ? writer_.Remove(stray) : RemoveTree(folder);
+    RemoveTree(TopOutside(stray, context_.root));
   }
 }
 

@@ -44,10 +44,11 @@ bool ShareFolders::WantsContent(const std::string& full_path) const {
   return type >= kinds->size() || (*kinds)[type];
 }
 
-std::vector<std::string> ShareFolders::TopmostBelow(const std::string& full_path) const {
+std::vector<std::string> ShareFolders::Topmost(const std::string& full_path) const {
+  if (PlaceOf(full_path) == Place::kIndexed) return {full_path};
   std::vector<std::string> topmost;
-  for (auto at = kinds_.lower_bound(full_path + "/"); at != kinds_.end() && StringStartWith(at->first, full_path + "/");
-       ++at) {
+  const std::string below = full_path + "/";
+  for (auto at = kinds_.lower_bound(below); at != kinds_.end() && StringStartWith(at->first, below); ++at) {
     if (Governing(Dirname(at->first)) == nullptr) topmost.push_back(at->first);
   }
   return topmost;

@@ -37,8 +37,8 @@ class ShareFolders {
   Place PlaceOf(std::string_view full_path) const;
   /// Whether the content of a file there is read: its kind is on, or it is of none of the four kinds.
   bool WantsContent(const std::string& full_path) const;
-  /// The folders below a path, without those that lie in another of them.
-  std::vector<std::string> TopmostBelow(const std::string& full_path) const;
+  /// What is indexed of all at and below a path: itself, or the folders below it that lie in no other.
+  std::vector<std::string> Topmost(const std::string& full_path) const;
   /// The folders that only one of the two has, and those whose kinds differ.
   std::vector<std::string> DifferingFrom(const ShareFolders& other) const;
 

@@ -36,7 +36,7 @@ using std::chrono::seconds;
 /// The queue is looked at again after so long, whether or not it was seen to change.
 constexpr seconds kSlowTimer(30);
 constexpr seconds kSlowTimerWithoutWatch(2);
-constexpr milliseconds kRenamePoll(200);
+constexpr milliseconds kEventPoll(200);
 constexpr int kClearedByReindex = StatusMgr::kNeedReindex | StatusMgr::kSecondCondition;
 
 bool HasContent(const std::string& path) {
@@ -138,9 +138,9 @@ milliseconds ShareWorker::Round() {
     delay_ = milliseconds(0);
     last_failure_ = 0;
     told_no_space_ = false;
-    if (AwaitsRename()) {
-      status_.SetState(ShareStatus::State::kStarting, "the index is that of an earlier name or place of the share");
-      return kRenamePoll;
+    if (AwaitsEvent()) {
+      status_.SetState(ShareStatus::State::kStarting, "the index is from before a change that is yet to be told");
+      return kEventPoll;
     }
     status_.SetState(ShareStatus::State::kIdle);
     return watch_.SeesChanges() ? kSlowTimer : kSlowTimerWithoutWatch;
@@ -267,11 +267,12 @@ void ShareWorker::MakeMissingIndex() {
   index_->Create();
 }
 
-/// Whether documents have paths of before the share was renamed or moved, although the queue is empty: the event that
-/// tells of it is yet to come. If it does not, a reindex puts the index right.
-bool ShareWorker::AwaitsRename() {
+/// Whether the index that this worker took over holds documents that no folder wants, although the queue is empty:
+/// those of before the share was renamed or moved, for example. The event that tells of it may be yet to come. If it
+/// does not, a reindex puts the index right.
+bool ShareWorker::AwaitsEvent() {
   if (strays_looked_for_) return false;
-  strays_looked_for_ = FindStray(*index_, root_).empty();
+  strays_looked_for_ = FindStray(*index_, LoadFolders().Topmost(root_)).empty();
   if (strays_looked_for_) return false;
   const auto now = std::chrono::steady_clock::now();
   if (!strays_since_) strays_since_ = now;

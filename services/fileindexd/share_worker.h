@@ -90,7 +90,7 @@ class ShareWorker {
   void CheckShare();
   void EnsureIndex();
   void MakeMissingIndex();
-  bool AwaitsRename();
+  bool AwaitsEvent();
   void QueueNeededReindex();
   bool QueueReindex();
   void RunPass();

@@ -1,36 +1,35 @@
 #include "services/fileindexd/stray_documents.h"
 
-#include <vector>
+#include <algorithm>
 
 #include "common/file_util.h"
 
 namespace ferrox::indexd {
 
-namespace {
-
-std::string FirstOutside(const std::vector<IndexedEntry>& found, const std::string& root) {
-  return found.empty() || StringStartWith(found.front().path, root + "/") ? "" : found.front().path;
+std::string FindStray(ShareIndex& index, const std::vector<std::string>& folders) {
+  const auto holder = [&folders](const std::string& path) {
+    const auto holds = [&path](const std::string& folder) { return StringStartWith(path + "/", folder + "/"); };
+    return std::find_if(folders.begin(), folders.end(), holds);
+  };
+  std::string after;
+  while (true) {
+    const auto next = index.List("", after, 1);
+    if (next.empty()) return "";
+    const std::string& path = next.front().path;
+    const auto folder = holder(path);
+    if (folder == folders.end()) return path;
+    // What is below a folder comes in one piece, and all of it before the path that ends in "0", which follows "/".
+    after = path == *folder ? path : *folder + "0";
+    if (path != *folder && holder(after) == folders.end() && !index.Find(after).empty()) return after;
+  }
 }
 
-}  // namespace
-
-std::string FindStray(ShareIndex& index, const std::string& root) {
-  std::string stray = FirstOutside(index.List("", "", 1), root);
-  if (!stray.empty()) return stray;
-  // "0" follows "/": all below the root comes before this.
-  const std::string behind = root + "0";
-  stray = FirstOutside(index.Find(behind), root);
-  return !stray.empty() ? stray : FirstOutside(index.List("", behind, 1), root);
-}
-
-std::string FolderOfStrays(const std::string& stray, const std::string& root) {
-  size_t end = 0;
-  do {
-    end = stray.find('/', end + 1);
-    const std::string top = stray.substr(0, end);
-    if (!StringStartWith(root + "/", top + "/")) return top;
-  } while (end != std::string::npos);
-  return "";
+std::string TopOutside(const std::string& path, const std::string& root) {
+  size_t end = path.find('/', 1);
+  while (end != std::string::npos && StringStartWith(root + "/", path.substr(0, end) + "/")) {
+    end = path.find('/', end + 1);
+  }
+  return path.substr(0, end);
 }
 
 }  // namespace ferrox::indexd

@@ -1,17 +1,18 @@
 #pragma once
 
 #include <string>
+#include <vector>
 
 #include "services/fileindexd/share_index.h"
 
 namespace ferrox::indexd {
 
-/// A document that does not lie below the share's folder `root`, "" when there is none. After the share was renamed or
-/// moved, all of them are such until the rename is carried out. Asks the index three things at most.
-std::string FindStray(ShareIndex& index, const std::string& root);
+/// The first document that lies neither at nor below one of the folders, none of which lies in another; "" when there
+/// is none. Asks the index about three things a folder at most.
+std::string FindStray(ShareIndex& index, const std::vector<std::string>& folders);
 
-/// The shallowest folder at or above the stray that does not hold `root`, so that all in it are strays; "" when the
-/// stray itself holds it.
-std::string FolderOfStrays(const std::string& stray, const std::string& root);
+/// The shallowest folder at or above a path outside of `root` that does not hold `root`, so that all in it lies
+/// outside.
+std::string TopOutside(const std::string& path, const std::string& root);
 
 }  // namespace ferrox::indexd

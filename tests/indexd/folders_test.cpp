@@ -157,8 +157,7 @@ TEST_F(FoldersTest, RenamedShareTakesItsDocumentsAlong) {
       MakeTree();
       StartWith(folders);
       kept = index->documents;
-      kept["/elsewhere/stray"] = {};
-      kept[root + "0"] = {};
+      for (const char* stray : {"0", "-x", "/old", ".elsewhere/stray"}) kept[root + stray] = {};
       Configure(share, {});
       fs::rename(old_root, old_root + "new");
       share += "new";
