@@ -97,13 +97,18 @@ class Instance:
             connection.sendall(struct.pack("=I", len(body)) + body)
             return json.loads(receive(connection).decode("utf-8", "surrogateescape"))
 
-    def documents(self, share, folder):
-        """The paths of all documents below a folder, as bytes, in the index's order."""
-        query = {"qsl": {"prefix": {"KOVAMDPath": folder + "/"}}, "load_field": ["KOVAMDPath"]}
+    def entries(self, share, folder, *fields):
+        """The named fields of all documents below a folder ("": of all), in the index's order."""
+        query = {"qsl": {"prefix": {"KOVAMDPath": folder + "/"}}, "load_field": fields}
         reply = self.ask("kovaelasticd", {"command": "document_get_by_query",
                                           "data": {"id": "fileindex_" + share, "query": query}})
         assert reply["success"], reply
-        return [entry["KOVAMDPath"].encode("utf-8", "surrogateescape") for entry in reply["data"]]
+        return reply["data"]
+
+    def documents(self, share, folder):
+        """The paths of all documents below a folder, as bytes, in the index's order."""
+        return [entry["KOVAMDPath"].encode("utf-8", "surrogateescape")
+                for entry in self.entries(share, folder, "KOVAMDPath")]
 
     # Shares and queues.
 

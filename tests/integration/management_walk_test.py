@@ -36,11 +36,7 @@ class ManagementWalkTest(unittest.TestCase):
         self.instance.wait_idle(share, folder)
         expected = [os.fsencode(path) for path in indexed if path != folder]
         expected += [path for parent in indexed for path in on_disk(parent)]
-        query = {"qsl": {"prefix": {"KOVAMDPath": self.vol[:-len("vol")]}}, "load_field": ["KOVAMDPath"]}
-        reply = self.instance.ask("kovaelasticd", {"command": "document_get_by_query",
-                                                   "data": {"id": "fileindex_" + share, "query": query}})
-        documents = {entry["KOVAMDPath"].encode("utf-8", "surrogateescape") for entry in reply["data"]}
-        self.assertEqual(set(expected), documents - {os.fsencode(folder)})
+        self.assertEqual(set(expected), set(self.instance.documents(share, "")) - {os.fsencode(folder)})
 
     def expect_found(self, word, *paths):
         self.assertEqual({os.fsencode(path) for path in paths}, set(self.instance.search(word)), word)

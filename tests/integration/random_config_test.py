@@ -93,7 +93,9 @@ class World:
         files = [self.modify_file, self.move_folder, self.move_file, self.remove, self.make_folder]
         events = [self.rename_share, self.migrate, self.pause, self.resume, self.forget, self.rename_user, self.homes,
                   self.recycle, self.kill, self.wait]
-        self.random.choice(self.random.choice([configuration, files, events]))()
+        kind = self.random.choice([configuration, files, events])
+        for _ in range(self.random.randrange(1, 20) if kind is files else 1):
+            self.random.choice(kind)()
 
     def folder_set(self):
         share = self.some_share()
@@ -131,16 +133,27 @@ class World:
             return
         self.number += 1
         new = f"{target}/" + self.random.choice([f"moved{self.number}", "anna", "bert"])
-        if not os.path.exists(new):
-            os.rename(old, new)
-            self.tell(share, event(RENAME, new, old, True))
+        if os.path.exists(new):
+            return
+        os.rename(old, new)
+        events = [event(RENAME, new, old, True)]
+        if self.random.random() < 0.3:  # the old name is used again
+            self.fill(old)
+            events.append(event(CREATE, old, "", True))
+        self.tell(share, *events)
 
     def move_file(self):
         share = self.some_share()
         old, new = (f"{self.some_folder(share)}/{self.random.choice(NAMES)}" for _ in range(2))
-        if os.path.exists(old) and old != new:
-            os.rename(old, new)
-            self.tell(share, event(RENAME, new, old))
+        if not os.path.exists(old) or old == new:
+            return
+        os.rename(old, new)
+        events = [event(RENAME, new, old)]
+        if self.random.random() < 0.3:
+            self.number += 1
+            write(old, f"back {self.number}")
+            events.append(event(CREATE, old))
+        self.tell(share, *events)
 
     def remove(self):
         share = self.some_share()
@@ -270,11 +283,7 @@ class World:
 
 def documents(instance, share):
     """All documents of the share's index, by path."""
-    query = {"qsl": {"prefix": {"KOVAMDPath": "/"}}, "load_field": FIELDS}
-    reply = instance.ask("kovaelasticd", {"command": "document_get_by_query",
-                                          "data": {"id": "fileindex_" + share, "query": query}})
-    assert reply["success"], reply
-    entries = {entry["KOVAMDPath"]: entry for entry in reply["data"]}
+    entries = {entry["KOVAMDPath"]: entry for entry in instance.entries(share, "", *FIELDS)}
     for entry in entries.values():
         if entry["KOVAMDIsDir"]:  # what changes in a folder is told, not that the folder's own size and times change
             entry.update(KOVAMDFSSize=0, _KOVAStamp="")
