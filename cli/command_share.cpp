@@ -44,8 +44,7 @@ void DropRemains(const std::string& name, const std::string& queue_path) {
   } catch (const Error& error) {
     if (error.Code() != Error::kEngineNoSuchIndex) throw;
   }
-  (void)Unlink(queue_path);
-  (void)Unlink(queue_path + ".tmp");
+  RemoveQueue(queue_path);
 }
 
 void RemoveShare(const std::string& name) {

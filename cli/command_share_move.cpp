@@ -164,8 +164,7 @@ void Follow(const Move& move, void (*move_index)(const Move& move), const std::s
                                                   KOVA::KOVANOTIFYD::MONITOR_QUEUE_TYPE_APPLICATION);
     move_index(move);
     if (!paused) GoOn(move);
-    (void)Unlink(old_queue);
-    (void)Unlink(old_queue + ".tmp");
+    RemoveQueue(old_queue);
   } catch (const Error& error) {
     throw Failure(Explain(error, rest));
   } catch (const Failure& failure) {

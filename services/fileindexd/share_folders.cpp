@@ -1,11 +1,41 @@
 #include "services/fileindexd/share_folders.h"
 
+#include <json/value.h>
+
+#include "common/error.h"
 #include "common/file_util.h"
+#include "common/json_util.h"
 #include "fileindex/folder_mgr.h"
 #include "fileindex/util.h"
 #include "sdk/share.h"
 
 namespace ferrox::indexd {
+
+namespace {
+
+constexpr std::array<const char*, 4> kKindNames = {"document", "audio", "video", "photo"};
+
+}  // namespace
+
+ShareFolders ShareFolders::FromJson(const Json::Value& stored) {
+  ShareFolders folders;
+  if (!IsJsonObject(stored)) throw Error(Error::kBadArgument, "not an object");
+  for (const std::string& path : stored.getMemberNames()) {
+    Kinds& kinds = folders.kinds_[path];
+    for (size_t kind = 0; kind < kinds.size(); ++kind) {
+      GetJsonValue(kinds[kind], stored[path], kKindNames[kind], true);
+    }
+  }
+  return folders;
+}
+
+Json::Value ShareFolders::ToJson() const {
+  Json::Value stored(Json::objectValue);
+  for (const auto& [path, kinds] : kinds_) {
+    for (size_t kind = 0; kind < kinds.size(); ++kind) stored[path][kKindNames[kind]] = kinds[kind];
+  }
+  return stored;
+}
 
 ShareFolders ShareFolders::Load(const std::string& share, const std::string& root) {
   ShareFolders loaded;

@@ -7,6 +7,8 @@
 #include <string_view>
 #include <vector>
 
+#include <json/forwards.h>
+
 namespace ferrox::indexd {
 
 /// The indexed folders of one share as they were configured at one moment: what decides, whatever the disk holds, which
@@ -26,6 +28,10 @@ class ShareFolders {
   /// The folders of `share`, whose own folder is `root`, as the folders file holds them now.
   /// @throws Error kLoadFailed; kBadArgument; kNoSuchShare; kInternal.
   static ShareFolders Load(const std::string& share, const std::string& root);
+  /// Back from ToJson. @throws Error kBadArgument for anything else.
+  static ShareFolders FromJson(const Json::Value& stored);
+  /// An object with a member for each folder, by its full path: an object of the kinds. Nothing else is kept.
+  Json::Value ToJson() const;
 
   /// Whether the same is indexed, paused or not.
   bool operator==(const ShareFolders& other) const {

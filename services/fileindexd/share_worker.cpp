@@ -95,6 +95,7 @@ ShareWorker::ShareWorker(const std::string& share, const Environment& environmen
       queue_path_(sdk::SDKShare(share).GetQueuePath()),
       environment_(environment),
       index_(environment.open_index(share)),
+      applied_(queue_path_ + ".folders"),
       watch_({queue_path_}) {}
 
 void ShareWorker::Start() {
@@ -105,6 +106,11 @@ void ShareWorker::Stop() {
   stopping_ = true;
   Wake();
   if (thread_.joinable()) thread_.join();
+}
+
+void ShareWorker::Forget() {
+  Stop();
+  applied_.Forget();
 }
 
 void ShareWorker::Wake() {
@@ -252,6 +258,7 @@ void ShareWorker::EnsureIndex() {
                    "the share has no index yet");
     MakeMissingIndex();
   }
+  if (index_->List("", "", 1).empty()) applied_.Forget();
   index_exists_ = true;
 }
 
@@ -263,34 +270,45 @@ void ShareWorker::MakeMissingIndex() {
   FERROX_FAIL_IF(LoadFolders().Count() == 0, Error::kEngineNoSuchIndex, "the share is not indexed any more");
   if (index_->Exists()) return;
   Log(LOG_WARNING, "the index of share %s is gone; it is made anew", share_.c_str());
-  (void)QueueReindex();
+  (void)Queue(fileindex::EVENT_REINDEX, root_);
   index_->Create();
 }
 
-/// Whether the index that this worker took over holds documents that no folder wants, although the queue is empty:
-/// those of before the share was renamed or moved, for example. The event that tells of it may be yet to come. If it
-/// does not, a reindex puts the index right.
+/// Whether the index is not what the folders want, although the queue is empty. The event that tells of it may be yet
+/// to come. If it does not, its sender has died or could not tell, and it is queued here.
 bool ShareWorker::AwaitsEvent() {
-  if (strays_looked_for_) return false;
-  strays_looked_for_ = FindStray(*index_, LoadFolders().Topmost(root_)).empty();
-  if (strays_looked_for_) return false;
+  const std::vector<std::string> differing = LoadFolders().DifferingFrom(applied_.Get());
+  const bool strays = HoldsStrays();
+  if (!strays && differing.empty()) {
+    awaits_since_.reset();
+    return false;
+  }
   const auto now = std::chrono::steady_clock::now();
-  if (!strays_since_) strays_since_ = now;
-  if (now - *strays_since_ >= environment_.patience) (void)QueueReindex();
+  if (!awaits_since_) awaits_since_ = now;
+  if (now - *awaits_since_ < environment_.patience) return true;
+  // The others are compared in the same pass.
+  strays ? Queue(fileindex::EVENT_REINDEX, root_) : Queue(fileindex::EVENT_UPDATE_CFG, differing.front());
   return true;
+}
+
+/// Whether the index that this worker took over holds documents that no folder wants: those of before the share was
+/// renamed or moved, for example.
+bool ShareWorker::HoldsStrays() {
+  strays_looked_for_ = strays_looked_for_ || FindStray(*index_, LoadFolders().Topmost(root_)).empty();
+  return !strays_looked_for_;
 }
 
 /// Turns the share's mark into a queued reindex.
 void ShareWorker::QueueNeededReindex() {
   if ((StatusMgr().GetShareStatus(share_) & StatusMgr::kNeedReindex) == 0) return;
-  if (QueueReindex()) StatusMgr().UnsetShareStatus(share_, kClearedByReindex);
+  if (Queue(fileindex::EVENT_REINDEX, root_)) StatusMgr().UnsetShareStatus(share_, kClearedByReindex);
 }
 
 /// False when the queue holds a damaged line and takes no event: the share is then marked, and asked for again once
 /// that queue has been worked off.
-bool ShareWorker::QueueReindex() {
+bool ShareWorker::Queue(int event, const std::string& path) {
   try {
-    fileindex::AddCustomEvent(fileindex::EVENT_REINDEX, root_, "", Json::Value());
+    fileindex::AddCustomEvent(event, path, "", Json::Value());
     return true;
   } catch (const Error& error) {
     if (error.Code() != Error::kMalformedEvent && error.Code() != Error::kBadArgument) throw;
@@ -311,18 +329,19 @@ void ShareWorker::RunPass() {
   queue.DeleteTmp();
   // While the queue was still there, a change made since may have been taken for one that it covers.
   QueueAgainIfChanged(runner, folders);
-  last_folders_ = folders;
+  applied_.Set(folders);
   status_.EndPass();
 }
 
-/// Where the folders differ from those of the last pass is compared, too: a reindex that waits in the queue swallows
-/// the event of a folder, or of a user, that was renamed into its place, and so what is to be done at the old one.
+/// Where the folders differ from those that the index is in line with is compared, too: a reindex that waits in the
+/// queue swallows the event of a folder, or of a user, that was renamed into its place, and so what is to be done at
+/// the old one.
 void ShareWorker::RunOperations(fileindex::QueueMgr& queue, OperationRunner& runner, const ShareFolders& folders) {
   const auto each = [&queue](const std::function<void(const fileindex::OP&)>& take) {
     (void)queue.ProcessOP([&take](const std::shared_ptr<fileindex::OP>& op) { take(*op); }, true);
   };
   try {
-    runner.Run(each, last_folders_ ? folders.DifferingFrom(*last_folders_) : std::vector<std::string>());
+    runner.Run(each, folders.DifferingFrom(applied_.Get()));
   } catch (const Interrupted&) {
     runner.KeepWhatIsDone();
     throw;

@@ -12,6 +12,7 @@
 #include <json/value.h>
 
 #include "common/error.h"
+#include "services/fileindexd/applied_folders.h"
 #include "services/fileindexd/file_watch.h"
 #include "services/fileindexd/interruption.h"
 #include "services/fileindexd/share_folders.h"
@@ -66,6 +67,8 @@ class ShareWorker {
   /// Ends the work where it is, for good; the queue stays as it is and is taken up again by the next worker. Returns
   /// when the thread has ended. Like Start, for one thread at a time.
   void Stop();
+  /// Stops, and keeps nothing: the share is not indexed any more.
+  void Forget();
   /// Looks again at the pause, the queue and the share's settings at once.
   void Wake();
 
@@ -92,7 +95,8 @@ class ShareWorker {
   void MakeMissingIndex();
   bool AwaitsEvent();
   void QueueNeededReindex();
-  bool QueueReindex();
+  bool HoldsStrays();
+  bool Queue(int event, const std::string& path);
   void RunPass();
   void RunOperations(fileindex::QueueMgr& queue, OperationRunner& runner, const ShareFolders& folders);
   ShareFolders LoadFolders();
@@ -106,8 +110,8 @@ class ShareWorker {
   std::unique_ptr<ShareIndex> index_;
   bool index_exists_ = false;
   bool strays_looked_for_ = false;
-  std::optional<std::chrono::steady_clock::time_point> strays_since_;
-  std::optional<ShareFolders> last_folders_;  ///< what the last finished pass went by
+  AppliedFolders applied_;
+  std::optional<std::chrono::steady_clock::time_point> awaits_since_;
   std::atomic<uint64_t> folder_count_{0};
   int last_failure_ = 0;
   std::chrono::steady_clock::time_point failing_since_;  ///< with that failure

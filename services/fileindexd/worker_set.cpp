@@ -86,6 +86,7 @@ void WorkerSet::ReconcileLocked() {
     const auto indexed = indexed_shares.find(share);
     const bool usable = indexed != indexed_shares.end() && indexed->second.root == worker->Root();
     if (!usable || !Wants(share, indexed->second)) End(share);
+    if (!usable) worker->Forget();
   }
   for (const auto& [share, indexed] : indexed_shares) {
     if (workers_.count(share) != 0 || !Wants(share, indexed)) continue;

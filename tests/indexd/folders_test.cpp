@@ -147,6 +147,24 @@ TEST_F(FoldersTest, ChangeSwallowedByAReindexElsewhereIsMadeUpFor) {
   EXPECT_EQ(Expected(), Indexed());
 }
 
+/// Whoever changed the folders died before the event was queued, or could not reach the daemon.
+TEST_F(FoldersTest, ChangeThatNobodyTellsOfIsCarriedOut) {
+  MakeTree();
+  for (const Folders& before : {kConfigurations[1], kConfigurations[3], kConfigurations[6]}) {
+    for (const Folders& after : kConfigurations) {
+      SCOPED_TRACE(testing::PrintToString(before) + " -> " + testing::PrintToString(after));
+      StartWith(before);
+      const std::set<std::string> indexed_before = Indexed();
+      Restart();
+      SetFolders(after);
+      worker->Start();
+      WaitForState("idle");
+      EXPECT_EQ(Expected(), Indexed());
+      EXPECT_EQ(ToWrite(indexed_before, Expected()), Written());
+    }
+  }
+}
+
 /// The index has been given the share's new name; its documents still have the paths of before.
 TEST_F(FoldersTest, RenamedShareTakesItsDocumentsAlong) {
   const std::string old_root = root;

@@ -52,6 +52,8 @@ TEST_F(ShareWorkerTest, ReindexTouchesOnlyWhatDiffers) {
 }
 
 TEST_F(ShareWorkerTest, CopiedTreeIsComparedOnce) {
+  Process(Line(kReindex, root));
+  index->lists = 0;
   std::string lines;
   std::string name = "d";
   for (int depth = 0; depth < 50; ++depth, name += "/d") {
