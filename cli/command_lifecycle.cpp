@@ -1,4 +1,5 @@
 #include <cstdio>
+#include <set>
 
 #include <kova/recycle.h>
 
@@ -8,6 +9,7 @@
 #include "cli/escape.h"
 #include "cli/folder_path.h"
 #include "cli/own_share.h"
+#include "cli/share_remains.h"
 #include "fileindex/folder_mgr.h"
 #include "fileindex/index_mgr.h"
 #include "sdk/share.h"
@@ -89,7 +91,10 @@ int RunShareForget(const Arguments& arguments) {
   const std::string path =
       arguments.words.size() > 1 ? AbsolutePath(arguments.words[1]) : sdk::SDKShare(name).GetPath();
   RequireEngine();
-  return ChangeAndReport([&] { fileindex::ShareClearPaused(name, path); }, "share " + name + " had no indexed folder");
+  const int code =
+      ChangeAndReport([&] { fileindex::ShareClearPaused(name, path); }, "share " + name + " had no indexed folder");
+  RemoveQueue(QueueOf(path));
+  return code;
 }
 
 int RunShareCheckRecycle(const Arguments& arguments) {
@@ -112,10 +117,18 @@ int RunVolumeResume(const Arguments& arguments) {
   return ChangeAndReport([&] { fileindex::VolumeResume(volume); }, "no paused folder lies on " + volume);
 }
 
+/// The operation itself leaves the indices, as if they had gone with the volume; on this host they lie elsewhere.
 int RunVolumeForget(const Arguments& arguments) {
   const std::string volume = AbsolutePath(arguments.words[0]);
-  return ChangeAndReport([&] { fileindex::VolumeClearPaused(volume); },
-                         "no folder was paused with the volume " + volume);
+  RequireEngine();
+  const std::set<std::string> before = FolderMgr().GetIndexedShares();
+  const int code =
+      ChangeAndReport([&] { fileindex::VolumeClearPaused(volume); }, "no folder was paused with the volume " + volume);
+  const std::set<std::string> after = FolderMgr().GetIndexedShares();
+  for (const std::string& share : before) {
+    if (after.count(share) == 0 && IsShare(share)) DropRemains(share, sdk::SDKShare(share).GetQueuePath());
+  }
+  return code;
 }
 
 int RunHomeEnable(const Arguments& arguments) {

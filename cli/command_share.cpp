@@ -6,9 +6,9 @@
 #include "cli/configuration_change.h"
 #include "cli/escape.h"
 #include "cli/own_share.h"
+#include "cli/share_remains.h"
 #include "common/error.h"
 #include "common/file_util.h"
-#include "fileindex/elastic/elastic_control.h"
 #include "fileindex/folder_mgr.h"
 #include "fileindex/index_mgr.h"
 #include "sdk/share.h"
@@ -33,18 +33,6 @@ Json::Value FoldersOf(const std::string& share) {
     if (folder->GetShare() == share) paths.append(folder->GetPath());
   }
   return paths;
-}
-
-/// What may be left of a share without indexed folders. The worker goes first, since it would make a dropped index
-/// anew; the queue would be taken for that of a later share of the same folder.
-void DropRemains(const std::string& name, const std::string& queue_path) {
-  (void)AskIndexDaemonIfRunning("worker_delete", ShareName(name));
-  try {
-    fileindex::elastic::ShareIndexDelete(name);
-  } catch (const Error& error) {
-    if (error.Code() != Error::kEngineNoSuchIndex) throw;
-  }
-  RemoveQueue(queue_path);
 }
 
 void RemoveShare(const std::string& name) {

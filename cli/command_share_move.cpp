@@ -4,7 +4,6 @@
 #include <cstdio>
 #include <functional>
 
-#include <kova/file_index.h>
 #include <kova/notifyd.h>
 
 #include "cli/ask.h"
@@ -15,6 +14,7 @@
 #include "cli/folder_path.h"
 #include "cli/format.h"
 #include "cli/own_share.h"
+#include "cli/share_remains.h"
 #include "common/clock.h"
 #include "common/error.h"
 #include "common/file_util.h"
@@ -48,13 +48,6 @@ struct Move {
 bool Exists(const std::string& path) {
   struct stat status = {};
   return lstat(path.c_str(), &status) == 0;
-}
-
-std::string QueueOf(const std::string& share_path) {
-  char path[4096] = {};
-  FERROX_FAIL_IF(0 > FILEIDXQueuePathCompose(share_path.c_str(), path, sizeof(path)), Error::kInternal,
-                 "FILEIDXQueuePathCompose failed, share_path=" + share_path);
-  return path;
 }
 
 bool HasIndex(const std::string& share) {

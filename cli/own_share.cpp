@@ -5,7 +5,6 @@
 
 #include "cli/command.h"
 #include "common/error.h"
-#include "common/file_util.h"
 #include "sdk/share.h"
 
 namespace ferrox::cli {
@@ -23,10 +22,6 @@ kova::host::ShareEntry OwnShare(const std::string& name, const std::string& verb
   if (const kova::host::ShareEntry* entry = table.ByName(name)) return *entry;
   if (!IsShare(name)) throw Error(Error::kNoSuchShare, name);
   throw Failure("share " + name + " is kept by the file-sharing service; " + verb + " it there first");
-}
-
-void RemoveQueue(const std::string& queue_path) {
-  for (const char* suffix : {"", ".tmp", ".folders"}) (void)Unlink(queue_path + suffix);
 }
 
 }  // namespace ferrox::cli

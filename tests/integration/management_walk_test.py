@@ -71,6 +71,7 @@ class ManagementWalkTest(unittest.TestCase):
         self.switch_a_kind(docs, roof, films, anna, berta)
         papers = self.rename_and_move(docs)
         self.pause_and_resume(papers, films)
+        self.forget_a_volume(papers)
         self.rename_a_user()
         self.delete_all(papers)
 
@@ -140,6 +141,15 @@ class ManagementWalkTest(unittest.TestCase):
             self.expect_found("list", films)
         names = {folder["path"]: folder["name"] for folder in self.instance.folders()}
         self.assertEqual({"/papers/letters": "Post", "/papers/plans": "plans", "/media/films": "films"}, names)
+
+    def forget_a_volume(self, papers):
+        self.ctl("volume", "pause", f"{self.vol}2")
+        self.ctl("volume", "forget", f"{self.vol}2")
+        self.assertEqual({"fileindex_media": False}, self.indices())
+        self.assertEqual(["/media/films"], [folder["path"] for folder in self.instance.folders()])
+        self.assertEqual([], [path for path in self.files_below("var/lib/kova/fileindex") if "papers" in path])
+        self.ctl("folder", "add", "/papers/letters", "/papers/plans")
+        self.expect_documents("papers", papers, f"{papers}/letters", f"{papers}/plans")
 
     def rename_a_user(self):
         homes = self.share_without_folders("homes")

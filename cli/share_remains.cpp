@@ -1,0 +1,35 @@
+#include "cli/share_remains.h"
+
+#include <kova/file_index.h>
+
+#include "cli/ask.h"
+#include "common/error.h"
+#include "common/file_util.h"
+#include "common/log.h"
+#include "fileindex/elastic/elastic_control.h"
+
+namespace ferrox::cli {
+
+std::string QueueOf(const std::string& share_path) {
+  char path[4096] = {};
+  FERROX_FAIL_IF(0 > FILEIDXQueuePathCompose(share_path.c_str(), path, sizeof(path)), Error::kInternal,
+                 "FILEIDXQueuePathCompose failed, share_path=" + share_path);
+  return path;
+}
+
+void RemoveQueue(const std::string& queue_path) {
+  for (const char* suffix : {"", ".tmp", ".folders"}) (void)Unlink(queue_path + suffix);
+}
+
+/// The worker goes first, since it would make a dropped index anew.
+void DropRemains(const std::string& share, const std::string& queue_path) {
+  (void)AskIndexDaemonIfRunning("worker_delete", ShareName(share));
+  try {
+    fileindex::elastic::ShareIndexDelete(share);
+  } catch (const Error& error) {
+    if (error.Code() != Error::kEngineNoSuchIndex) throw;
+  }
+  RemoveQueue(queue_path);
+}
+
+}  // namespace ferrox::cli
