@@ -120,6 +120,7 @@ int RunFolderReindex(const Arguments& arguments) {
   const std::vector<std::string> paths = SharePaths(arguments, configured);
   for (const std::string& path : paths) RequireIndexed(fileindex::GetShareNameByPath(path), configured);
   fileindex::FolderReindex(ToArray(paths));
+  for (const std::string& path : paths) (void)MarkIfBusy(fileindex::GetShareNameByPath(path));
   for (const std::string& path : paths) {
     (void)printf("queued: %s will be compared with its index\n", EscapeForTerminal(path).c_str());
   }

@@ -13,7 +13,6 @@
 #include "cli/format.h"
 #include "cli/progress.h"
 #include "common/error.h"
-#include "common/file_util.h"
 #include "fileindex/folder_mgr.h"
 #include "fileindex/index_mgr.h"
 #include "fileindex/optree.h"
@@ -44,16 +43,10 @@ Share OpenShare(const std::string& name) {
   return {name, share.GetPath(), share.GetQueuePath()};
 }
 
-/// A reindex that is being carried out may have passed by what has changed since, yet the library takes it for one that
-/// is still to come. Then the share is marked, and the daemon queues another one when it has finished. The library
-/// itself marks the share when its queue has a damaged line and takes no event.
+/// The library itself marks the share when its queue has a damaged line and takes no event.
 void QueueReindex(const Share& share) {
   try {
-    if (IsFileExist(share.queue_path + ".tmp")) {
-      fileindex::StatusMgr().SetShareStatus(share.name, fileindex::StatusMgr::kNeedReindex);
-    } else {
-      fileindex::AddCustomEvent(fileindex::EVENT_REINDEX, share.path, "", Json::Value());
-    }
+    if (!MarkIfBusy(share.name)) fileindex::AddCustomEvent(fileindex::EVENT_REINDEX, share.path, "", Json::Value());
   } catch (const Error& error) {
     if (error.Code() != Error::kMalformedEvent && error.Code() != Error::kBadArgument) throw;
   }

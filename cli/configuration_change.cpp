@@ -10,6 +10,8 @@
 #include "common/paths.h"
 #include "common/scope_exit.h"
 #include "fileindex/folder_mgr.h"
+#include "fileindex/status_mgr.h"
+#include "sdk/share.h"
 
 namespace ferrox::cli {
 
@@ -56,6 +58,12 @@ bool IsPaused(const std::string& share) {
   const auto& folders = configured.GetFolders();
   return std::any_of(folders.begin(), folders.end(),
                      [&](const auto& folder) { return folder->IsPaused() && folder->GetShare() == share; });
+}
+
+bool MarkIfBusy(const std::string& share) {
+  if (!IsFileExist(sdk::SDKShare(share).GetQueuePath() + ".tmp")) return false;
+  fileindex::StatusMgr().SetShareStatus(share, fileindex::StatusMgr::kNeedReindex);
+  return true;
 }
 
 void RequireIndexed(const std::string& share, const fileindex::FolderMgr& configured) {

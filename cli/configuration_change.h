@@ -16,6 +16,11 @@ void ChangeConfiguration(const std::function<void()>& change);
 /// Whether a folder of the share is paused.
 bool IsPaused(const std::string& share);
 
+/// A reindex that is being carried out may have passed by what has changed since, yet the library takes it for one that
+/// is still to come and queues no other. Then the share is marked, and the daemon reindexes it when it has finished.
+/// @return whether the daemon is at work on the share's queue. @throws Error kNoSuchShare; as StatusMgr does.
+bool MarkIfBusy(const std::string& share);
+
 /// @throws Failure when no folder of the share is indexed.
 void RequireIndexed(const std::string& share, const fileindex::FolderMgr& configured);
 

@@ -142,6 +142,18 @@ class DaemonsTest(unittest.TestCase):
         self.instance.ctl("index", "docs", "--wait")
         self.expect_index_is_disk("docs", folder)
 
+    def test_reindex_asked_for_during_another_is_not_lost(self):
+        folder = self.up_with_share()
+        self.instance.wait_idle("docs", folder)
+        self.fill(folder, 4000)
+        self.instance.ctl("index", "docs")
+        wait_for(lambda: self.instance.share_status("docs")["written"] > 100, "indexing to begin")
+        with open(f"{folder}/!passed by already.txt", "w", encoding="ascii") as file:
+            file.write("late")
+        self.instance.ctl("folder", "reindex", "/docs")
+        self.instance.wait_idle("docs", folder)
+        self.expect_index_is_disk("docs", folder)
+
     def test_paused_share_stops_at_once_and_goes_on_where_it_was(self):
         folder = self.up_with_share()
         self.instance.wait_idle("docs", folder)
