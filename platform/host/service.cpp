@@ -25,8 +25,8 @@ constexpr ServiceRow kFileSharing = {"samba", nullptr, nullptr, "smbd.service"};
 bool HasServiceManager() { return kova::InstanceRoot().empty() && access("/run/systemd/system", F_OK) == 0; }
 
 bool IsInstalled(const ServiceRow& service) {
-  for (const char* folder :
-       {"/etc/systemd/system/", "/run/systemd/system/", "/usr/lib/systemd/system/", "/lib/systemd/system/"}) {
+  for (const char* folder : {"/etc/systemd/system/", "/run/systemd/system/", "/usr/local/lib/systemd/system/",
+                             "/usr/lib/systemd/system/", "/lib/systemd/system/"}) {
     if (access((folder + std::string(service.unit)).c_str(), F_OK) == 0) return true;
   }
   return false;

@@ -1,0 +1,63 @@
+#!/bin/bash
+# usage: check_systemd.sh BUILD_FOLDER    Installs the build into a fresh small system, boots that in a container, and has
+# the services started, killed, stopped and started at boot by systemd. As root, with debootstrap and systemd-container.
+set -euo pipefail
+build=$1
+system=$(mktemp -d)
+trap 'rm -rf "$system"' EXIT
+
+debootstrap --variant=minbase --include=systemd,systemd-sysv,libjsoncpp25,libsqlite3-0,libzstd1,libuchardet0 bookworm \
+  "$system" >"$build/systemd-image.log"
+DESTDIR=$system cmake --install "$build" --prefix /usr >/dev/null
+systemctl --root="$system" --quiet enable kovaelasticd.service fileindex-prepare.service
+
+cat >"$system/walk" <<'WALK'
+#!/bin/bash
+trap 'systemctl poweroff --no-block' EXIT
+set -eux
+expect() { [[ "$(systemctl is-active kovaelasticd.service fileindexd.service | tr '\n' ' ')" == "$* " ]]; }
+finds() { for _ in {1..50}; do fileindexctl search "$1" && return; sleep 0.1; done; false; }
+if [[ ! -e /srv/docs ]]; then
+  mkdir -p /srv/docs
+  echo lantern >/srv/docs/a.txt
+  sleep 1
+  expect active inactive
+  [[ -e /tmp/ferrox_cfg_folder.lock ]]
+  fileindexctl up
+  fileindexctl share add /srv/docs
+  expect active active
+  finds lantern
+  systemctl kill -s KILL fileindexd.service
+  sleep 3
+  expect active active
+  fileindexctl folder delete /docs
+  expect active inactive
+  fileindexctl folder add /docs
+  expect active active
+  echo "first boot done"
+else
+  expect active active
+  finds lantern
+  fileindexctl down
+  expect inactive inactive
+  echo "second boot done"
+fi
+WALK
+chmod +x "$system/walk"
+cat >"$system/etc/systemd/system/walk.service" <<'UNIT'
+[Unit]
+After=fileindex-prepare.service
+[Service]
+ExecStart=/walk
+StandardOutput=append:/walk.log
+StandardError=append:/walk.log
+[Install]
+WantedBy=multi-user.target
+UNIT
+systemctl --root="$system" --quiet enable walk.service
+
+for boot in first second; do
+  timeout 120 systemd-nspawn --quiet --boot --directory="$system" --register=no --keep-unit >"$build/systemd-boot.log" 2>&1 || true
+  grep -q "^$boot boot done" "$system/walk.log" || { cat "$system/walk.log"; exit 1; }
+done
+echo "systemd: started, killed, stopped, and started again at boot"
