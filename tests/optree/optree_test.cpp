@@ -2,12 +2,10 @@
 
 #include <gtest/gtest.h>
 
-#include "common/error.h"
 #include "common/new_class.h"
 #include "fileindex/util.h"
-#include "tests/support/log_capture.h"
+#include "tests/support/library_test.h"
 #include "tests/support/queue_lines.h"
-#include "tests/support/temp_dir.h"
 
 namespace ferrox::test {
 
@@ -33,25 +31,23 @@ TEST(OPTreeTest, Folding) {
     std::vector<std::string> lines;
     const char* operations;
   } kCases[] = {
-      {"an empty queue", {}, ""},
       {"changes of one file are one upsert", {Create("/v/f"), Modify("/v/f"), Attr("/v/f")}, "[02] /v/f\n"},
       {"a created file may have been indexed before", {Create("/v/f"), Delete("/v/f")}, "[01] /v/f\n"},
-      {"a file that comes back", {Delete("/v/f"), Create("/v/f")}, "[02] /v/f\n"},
       {"a modify after a delete is dropped", {Delete("/v/f"), Modify("/v/f")}, "[01] /v/f\n"},
-      {"a delete stays beside a reindex", {Reindex("/v/f"), Delete("/v/f")}, "[06] /v/f\n[01] /v/f\n"},
       {"flags add up",
        {UpdateCfg("/v", "audio"), UpdateCfg("/v", "video"), UpdateCfg("/v", "audio", false)},
        "[04] /v, data={\"audio\":true,\"document\":false,\"photo\":false,\"video\":true}\n"},
-      {"a folder's creation is a reindex", {Line(EVENT_CREATE, "/v/d", "", true)}, "[06] /v/d\n"},
+      {"what is no flags adds none",
+       {Line(EVENT_UPDATE_CFG, "/v", "", true, "audio"), UpdateCfg("/v", "photo"),
+        Line(EVENT_UPDATE_CFG, "/v", "", true, 3)},
+       "[04] /v, data={\"audio\":false,\"document\":false,\"photo\":true,\"video\":false}\n"},
       {"a reindex covers what lies below",
        {Create("/v/a/x"), Rename("/v/o", "/v/a/r"), Create("/v/a/y/z"), Create("/v/ab"), Reindex("/v/a")},
        "[05] /v/o -> /v/a/r\n[02] /v/ab\n[06] /v/a\n"},
       {"a dropped reindex covers it too", {Delete("/v/a"), Create("/v/a/x"), Reindex("/v/a")}, "[01] /v/a\n"},
-      {"content work follows the rename", {Modify("/a/f"), Rename("/a/f", "/a/g")}, "[05] /a/f -> /a/g\n[02] /a/g\n"},
       {"a folder's rename takes all but deletes along",
        {Modify("/a/b/f"), Delete("/a/b/g"), Rename("/a", "/z")},
        "[02] /z/b/f\n[01] /a/b/g\n[05] /a -> /z\n"},
-      {"both bits on one line come to nothing", {Line(EVENT_ATTR | EVENT_MODIFY, "/v/f")}, ""},
       {"a rename into itself ends", {Modify("/a/f"), Rename("/a", "/a/b")}, "[02] /a/b/f\n[05] /a -> /a/b\n"},
   };
   for (const auto& test : kCases) EXPECT_EQ(Fold(test.lines), test.operations) << test.claim;
@@ -63,16 +59,16 @@ TEST(OPTreeTest, BadLinesAreLoggedAndSkipped) {
   EXPECT_EQ(Fold({"{half", Create("/v/a"), huge, std::string(50, '\0'), Create("/v/b/"), Create("v"),
                   Rename("", "/v/c"), "", Create("/v/d")}),
             "[02] /v/a\n[02] /v/d\n");
-  const char* const logged[] = {
-      "InsertEvent failed, event_raw={half, code=906, reason=Malformed event_raw: {half",
-      "xxx..., code=906, reason=Malformed event_raw: {",
-      R"(event_raw=\x00\x00)",
-      "code=9999, reason=GetNodeByPath failed, path=/v/b/",
-      "(GetNodeByPath) Failed [",
-      "code=9999, reason=GetNodeByPath failed, path=",
-      "event_raw=, code=906",
-  };
-  for (const char* text : logged) EXPECT_TRUE(LogCapture::Contains(text)) << text;
+  for (const char* text : {
+           "InsertEvent failed, event_raw={half, code=906, reason=Malformed event_raw: {half",
+           "xxx..., code=906, reason=Malformed event_raw: {",
+           R"(event_raw=\x00\x00)",
+           "code=9999, reason=GetNodeByPath failed, path=/v/b/",
+           "(GetNodeByPath) Failed [",
+           "event_raw=, code=906",
+       }) {
+    EXPECT_TRUE(LogCapture::Contains(text)) << text;
+  }
   EXPECT_FALSE(LogCapture::Contains("[err:"));
 }
 
@@ -84,13 +80,7 @@ TEST(OPTreeTest, NothingCountsBesideACrash) {
 
 TEST(OPTreeTest, MissingQueue) {
   const LogCapture log;
-  try {
-    OPTree tree("/nowhere/queue");
-    ADD_FAILURE();
-  } catch (const Error& error) {
-    EXPECT_EQ(error.Code(), Error::kInternal);
-    EXPECT_STREQ(error.what(), "Failed to open queue, reason=No such file or directory");
-  }
+  EXPECT_EQ(FailureOf([] { OPTree("/nowhere/queue"); }), "502 Failed to open queue, reason=No such file or directory");
   EXPECT_TRUE(LogCapture::Contains(" (BuildTree) Failed [!input_stream], reason: Failed to open queue"));
 }
 
@@ -119,24 +109,6 @@ TEST_F(OPTreeNodesTest, OnlyNormalizedPathsAreFoundButAllAreMade) {
   EXPECT_EQ(tree.root->children[0]->children[0]->GetPath(), "/a/b");
   EXPECT_EQ(tree.GetNodeByPath("/a/b"), tree.root->children[0]->children[0]);
   EXPECT_EQ(tree.root->GetPath(), "");
-}
-
-TEST_F(OPTreeNodesTest, ChildrenStayInOrderAndAreFoundAgain) {
-  OPTree tree(dir_ / "empty");
-  std::vector<std::shared_ptr<OPNode>> nodes;
-  for (int i = 0; i < 1000; ++i) nodes.push_back(tree.GetNodeByPath("/d/" + std::to_string(i * 7919 % 1000)));
-  EXPECT_EQ(nodes[0]->parent->children, nodes);
-  for (const auto& node : nodes) EXPECT_EQ(node->parent->GetChild(node->name), node);
-}
-
-TEST_F(OPTreeNodesTest, TraversalPassesANodeAfterThoseBelowIt) {
-  OPTree tree(dir_ / "empty");
-  for (const char* path : {"/a/b/c", "/a/d"}) tree.GetNodeByPath(path);
-  std::string passed;
-  const auto fn = [&passed](std::shared_ptr<OPNode> node) { passed += node->GetPath() + " "; };
-  tree.TraverseNodeDescendant(tree.GetNodeByPath("/a"), fn, true);
-  tree.TraverseNodeDescendant(tree.GetNodeByPath("/a/d"), fn, false);
-  EXPECT_EQ(passed, "/a/b/c /a/b /a/d /a/d ");
 }
 
 TEST_F(OPTreeNodesTest, KeptOperationsOutliveTheTree) {
@@ -192,29 +164,6 @@ TEST_F(OPTreeNodesTest, TextForms) {
   std::ostringstream text;
   text << node;
   EXPECT_EQ(text.str(), "Node[a]: \n  [00] /v/a\n  [05] /v/o -> /v/a\n");
-  EXPECT_EQ(text.fill(), '0');
-}
-
-TEST(OPTest, MergeDataAddsFlags) {
-  Json::Value pending;
-  pending["audio"] = true;
-  pending["video"] = 1;
-  pending["path"] = "/a";
-  OP op(nullptr, OP_UPDATE_CFG, "", pending);
-  Json::Value incoming;
-  incoming["audio"] = false;
-  incoming["photo"] = 1;
-  op.MergeData(incoming);
-  EXPECT_EQ(toString(op.data), R"({"audio":true,"document":false,"path":"/a","photo":true,"video":false})");
-  for (const char* text : {"null", "3", "[true]", "\"audio\""}) {
-    Json::Value odd;
-    ASSERT_TRUE(fromString(odd, text));
-    op.MergeData(odd);
-    EXPECT_TRUE(op.data["photo"].asBool()) << text;
-    OP strange(nullptr, OP_UPDATE_CFG, "", odd);
-    strange.MergeData(incoming);
-    EXPECT_TRUE(strange.data["photo"].asBool()) << text;
-  }
 }
 
 }  // namespace

@@ -3,7 +3,6 @@
 #include <sys/socket.h>
 #include <sys/un.h>
 
-#include <cstring>
 #include <optional>
 #include <thread>
 
@@ -15,23 +14,30 @@
 namespace ferrox::services {
 namespace {
 
+/// A new socket on which `use`, bind or connect, was called with the path.
+template <typename Use>
+UniqueFd Socket(const std::string& path, const Use& use) {
+  UniqueFd fd(socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0));
+  sockaddr_un address = {};
+  address.sun_family = AF_UNIX;
+  (void)path.copy(address.sun_path, sizeof(address.sun_path) - 1);
+  EXPECT_EQ(use(fd.Get(), reinterpret_cast<const sockaddr*>(&address), sizeof(address)), 0);
+  return fd;
+}
+
 /// A client that says exactly the bytes it is told to.
 class Client {
  public:
-  explicit Client(const std::string& path) : fd_(socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0)) {
-    sockaddr_un address = {};
-    address.sun_family = AF_UNIX;
-    memcpy(address.sun_path, path.c_str(), path.size() + 1);
-    EXPECT_EQ(connect(fd_.Get(), reinterpret_cast<const sockaddr*>(&address), sizeof(address)), 0);
-  }
+  explicit Client(const std::string& path) : fd_(Socket(path, connect)) {}
 
   void SendRaw(const std::string& bytes) {
     EXPECT_EQ(send(fd_.Get(), bytes.data(), bytes.size(), MSG_NOSIGNAL), static_cast<ssize_t>(bytes.size()));
   }
   void SendLength(uint32_t length) { SendRaw({reinterpret_cast<const char*>(&length), sizeof(length)}); }
-  void SendFrame(const std::string& body) {
+  std::optional<std::string> Ask(const std::string& body) {
     SendLength(static_cast<uint32_t>(body.size()));
     SendRaw(body);
+    return ReceiveFrame();
   }
 
   /// The next reply's body; none when the server has ended the connection.
@@ -51,9 +57,8 @@ class Client {
 /// A server that answers with the request reversed, fails on "fail", and runs while the fixture lives.
 class FrameServerTest : public testing::Test {
  protected:
-  void Start(FrameServerOptions options) {
-    options.socket_path = path_;
-    server_ = std::make_unique<FrameServer>(options, [](const std::string& request, const Peer& peer) {
+  void Start() {
+    server_ = std::make_unique<FrameServer>(options_, [](const std::string& request, const Peer& peer) {
       EXPECT_EQ(peer.uid, geteuid());
       if (request == "fail") throw std::runtime_error("asked to");
       return std::string(request.rbegin(), request.rend());
@@ -68,31 +73,28 @@ class FrameServerTest : public testing::Test {
 
   test::TempDir folder_;
   const std::string path_ = folder_ / "socket";
+  FrameServerOptions options_ = {path_};
   std::unique_ptr<FrameServer> server_;
   std::thread thread_;
 };
 
 TEST_F(FrameServerTest, AnswersSeveralRequestsOfOneConnectionSentInPieces) {
-  Start({});
+  Start();
   Client client(path_);
   const std::string big(300000, 'x');
   for (const std::string& body : {std::string("abc"), std::string(), big}) {
     const auto length = static_cast<uint32_t>(body.size());
     const std::string frame = std::string(reinterpret_cast<const char*>(&length), 4) + body;
-    for (size_t at = 0; at < frame.size();) {
-      const size_t piece = at < 6 ? 1 : frame.size() - at;
-      client.SendRaw(frame.substr(at, piece));
-      at += piece;
-    }
+    for (const char byte : frame.substr(0, 6)) client.SendRaw({byte});
+    if (frame.size() > 6) client.SendRaw(frame.substr(6));
     EXPECT_EQ(client.ReceiveFrame(), std::string(body.rbegin(), body.rend()));
   }
 }
 
 TEST_F(FrameServerTest, HostileClientsCostOnlyTheirOwnConnection) {
-  FrameServerOptions options;
-  options.request_limit_bytes = 1000;
-  options.requests_limit_bytes = 1500;
-  Start(options);
+  options_.request_limit_bytes = 1000;
+  options_.requests_limit_bytes = 1500;
+  Start();
   Client silent(path_);
   Client huge(path_);
   huge.SendLength(0xFFFFFFFF);
@@ -104,25 +106,21 @@ TEST_F(FrameServerTest, HostileClientsCostOnlyTheirOwnConnection) {
     half.SendRaw("only this");
   }
   Client failing(path_);
-  failing.SendFrame("fail");
-  EXPECT_EQ(failing.ReceiveFrame(), std::nullopt);
+  EXPECT_EQ(failing.Ask("fail"), std::nullopt);
   Client good(path_);
-  good.SendFrame("abc");
-  EXPECT_EQ(good.ReceiveFrame(), "cba");
+  EXPECT_EQ(good.Ask("abc"), "cba");
 }
 
 TEST_F(FrameServerTest, UnansweredBytesAreBoundedAndGivenBack) {
-  FrameServerOptions options;
-  options.request_limit_bytes = 1000;
-  options.requests_limit_bytes = 1500;
-  Start(options);
+  options_.request_limit_bytes = 1000;
+  options_.requests_limit_bytes = 1500;
+  Start();
   for (int round = 0; round < 5; ++round) {
     Client first(path_);
     first.SendLength(1000);
     first.SendRaw(std::string(900, 'a'));
     Client probe(path_);  // once it is answered, what was sent before has been received
-    probe.SendFrame("x");
-    EXPECT_EQ(probe.ReceiveFrame(), "x");
+    EXPECT_EQ(probe.Ask("x"), "x");
     Client second(path_);
     second.SendLength(1000);
     second.SendRaw(std::string(900, 'b'));
@@ -133,35 +131,22 @@ TEST_F(FrameServerTest, UnansweredBytesAreBoundedAndGivenBack) {
 }
 
 TEST_F(FrameServerTest, NewcomerTakesThePlaceOfTheLongestSilent) {
-  FrameServerOptions options;
-  options.connections_max = 2;
-  Start(options);
+  options_.connections_max = 2;
+  Start();
   Client oldest(path_);
-  oldest.SendFrame("1");
-  EXPECT_EQ(oldest.ReceiveFrame(), "1");
+  EXPECT_EQ(oldest.Ask("1"), "1");
   Client second(path_);
-  second.SendFrame("2");
-  EXPECT_EQ(second.ReceiveFrame(), "2");
+  EXPECT_EQ(second.Ask("2"), "2");
   Client third(path_);
-  third.SendFrame("3");
-  EXPECT_EQ(third.ReceiveFrame(), "3");
+  EXPECT_EQ(third.Ask("3"), "3");
   EXPECT_EQ(oldest.ReceiveFrame(), std::nullopt);
-  second.SendFrame("4");
-  EXPECT_EQ(second.ReceiveFrame(), "4");
+  EXPECT_EQ(second.Ask("4"), "4");
 }
 
 TEST_F(FrameServerTest, ReplacesADeadProcessesSocketButNotALiveOnes) {
-  {
-    const UniqueFd dead(socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0));
-    sockaddr_un address = {};
-    address.sun_family = AF_UNIX;
-    memcpy(address.sun_path, path_.c_str(), path_.size() + 1);
-    ASSERT_EQ(bind(dead.Get(), reinterpret_cast<const sockaddr*>(&address), sizeof(address)), 0);
-  }
-  Start({});
-  FrameServerOptions options;
-  options.socket_path = path_;
-  EXPECT_THROW(FrameServer(options, [](const std::string& body, const Peer&) { return body; }), Error);
+  (void)Socket(path_, bind);
+  Start();
+  EXPECT_THROW(FrameServer(options_, [](const std::string& body, const Peer&) { return body; }), Error);
 }
 
 }  // namespace
