@@ -90,28 +90,5 @@ TEST(WordsTest, TrigramsCoverTheFoldedText) {
   EXPECT_EQ(Trigrams("東京都x", 1), (std::vector<std::string>{"東京都"}));
 }
 
-// Any bytes at all: nothing is read outside the text, every word is short and lies where it says.
-TEST(WordsTest, AnyBytesAreCut) {
-  uint32_t state = 12345;
-  for (int round = 0; round < 3000; ++round) {
-    std::string text;
-    for (size_t i = round % 40; i > 0; --i) {
-      state = state * 1664525 + 1013904223;
-      text += static_cast<char>((state >> 24) | ((state & 0x300) == 0 ? 0xE0 : 0));
-    }
-    WordScanner scanner(text);
-    size_t before = 0;
-    while (scanner.Next()) {
-      ASSERT_FALSE(scanner.Word().empty());
-      ASSERT_LE(scanner.Word().size(), kWordMaxBytes);
-      ASSERT_LE(before, scanner.Begin());
-      ASSERT_LT(scanner.Begin(), scanner.End());
-      ASSERT_LE(scanner.End(), text.size());
-      before = scanner.Begin();
-    }
-    (void)Trigrams(text, 100);
-  }
-}
-
 }  // namespace
 }  // namespace ferrox::engine
