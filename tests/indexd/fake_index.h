@@ -65,12 +65,10 @@ class FakeIndex : public indexd::ShareIndex {
     const std::lock_guard lock(mutex);
     (void)RequireDocument(old_path);
     std::map<std::string, Document> moved;
-    for (const auto& [path, document] : documents) {
-      const bool moves = path == old_path || StringStartWith(path, old_path + "/");
-      if (moves) moved[new_path + path.substr(old_path.size())] = document;
-    }
-    std::erase_if(documents, [&old_path](const auto& item) {
-      return item.first == old_path || StringStartWith(item.first, old_path + "/");
+    std::erase_if(documents, [&](const auto& item) {
+      const bool moves = item.first == old_path || StringStartWith(item.first, old_path + "/");
+      if (moves) moved[new_path + item.first.substr(old_path.size())] = item.second;
+      return moves;
     });
     for (const auto& [path, document] : moved) documents[path] = document;
     ++renames;

@@ -75,12 +75,5 @@ TEST(TreeWalkTest, RulesLeaveOutNamesAndFolders) {
       Walk(folder.Path(), rules));
 }
 
-TEST(TreeWalkTest, MissingFolderIsNotOpened) {
-  const test::TempDir folder;
-  const WalkRules rules;
-  EXPECT_FALSE(TreeWalk(folder / "missing", rules).Opened());
-  EXPECT_TRUE(TreeWalk(folder.Path(), rules).Opened());
-}
-
 }  // namespace
 }  // namespace ferrox::indexd
