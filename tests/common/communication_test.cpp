@@ -3,7 +3,6 @@
 #include <sys/socket.h>
 #include <unistd.h>
 
-#include <cstring>
 #include <memory>
 #include <thread>
 
@@ -43,17 +42,14 @@ using BufferTest = test::LibraryTest;
 }  // namespace
 
 TEST_F(SendCommandTest, RequestEndsInAZeroByteAndTheReplyIsDropped) {
-  // {"data":"...","type":"t"} of 100 bytes
-  const std::string data(100 - strlen(R"({"data":"","type":"t"})"), 'd');
   const std::string big(5000, 'r');
   for (const auto& [reply, piece] : {std::pair{Frame(""), 4U}, {Frame("ok"), 1U}, {Frame(big), 5000U}}) {
     std::string request;
     {
       const test::UnixServer daemon(InstancePath(kFileIndexdSocket), Daemon(request, reply, piece));
-      SendCommandToDaemon("t", data);
+      SendCommandToDaemon("t", "d");
     }
-    EXPECT_EQ(request, "{\"data\":\"" + data + "\",\"type\":\"t\"}" + '\0');
-    EXPECT_EQ(request.size(), 101U);
+    EXPECT_EQ(request, std::string(R"({"data":"d","type":"t"})") + '\0');
   }
 }
 

@@ -1,7 +1,6 @@
 #include "common/file_util.h"
 
 #include <sys/stat.h>
-#include <sys/wait.h>
 #include <unistd.h>
 
 #include <kova/fs.h>
@@ -13,7 +12,6 @@ namespace ferrox {
 namespace {
 
 namespace fs = std::filesystem;
-using test::ReadFile;
 using test::WriteFile;
 
 class FileUtilTest : public test::LibraryTest {
@@ -32,7 +30,6 @@ TEST_F(FileUtilTest, PathsAreCutAtTheLastSlash) {
            Row{"/a", "a", "", "", ""},
            Row{"bare", "bare", "bare", "", ""},
            Row{"/v.d/", "", "/v.d", "", ""},
-           Row{"/v.d/readme", "readme", "/v.d", "", ""},
            Row{"/v/.Hidden", ".Hidden", "/v", "Hidden", "hidden"},
            Row{"/v/a.tar.gz", "a.tar.gz", "/v", "gz", "gz"},
            Row{"/v/x.\xc4Z", "x.\xc4Z", "/v", "\xc4Z", "\xc4z"},
@@ -80,10 +77,8 @@ TEST_F(FileUtilTest, KindsOfEntries) {
 
 TEST_F(FileUtilTest, PlatformAnswersArePassedOn) {
   platform_.permissions = {{"/p", KOVA_PERM_READ | KOVA_PERM_EXECUTE}};
-  platform_.mount_points = {"/mnt"};
   EXPECT_TRUE(CheckACLPerm("/p", KOVA_PERM_READ | KOVA_PERM_WRITE));
   EXPECT_FALSE(CheckACLPerm("/p", KOVA_PERM_WRITE) || CheckACLPerm("/no/such", KOVA_PERM_READ));
-  EXPECT_TRUE(IsMountPoint("/mnt") && !IsMountPoint("/mnt/below"));
   WriteFile(dir_ / "a", "x");
   EXPECT_TRUE(CPFile(dir_ / "a", dir_ / "b") && MVFile(dir_ / "a", dir_ / "c"));
   EXPECT_FALSE(MVFile(dir_ / "a", dir_ / "d"));
@@ -115,23 +110,6 @@ TEST_F(FileUtilTest, WholeFileIsTheOldOneOrTheNewOne) {
   EXPECT_FALSE(ReadWholeFile(dir_ / "d", content));
   ASSERT_EQ(mkfifo((dir_ / "fifo").c_str(), 0600), 0);
   EXPECT_FALSE(ReadWholeFile(dir_ / "fifo", content)) << "and does not wait for a writer";
-}
-
-TEST_F(FileUtilTest, KilledWritersLeaveNoHalfFile) {
-  const std::string path = dir_ / "f";
-  const std::string contents[] = {std::string(300000, 'a'), std::string(200000, 'b')};
-  ASSERT_TRUE(WriteWholeFile(path, contents[0]));
-  for (int round = 0; round < 20; ++round) {
-    const pid_t writer = fork();
-    if (writer == 0) {
-      for (size_t i = 0;; ++i) (void)WriteWholeFile(path, contents[i % 2]);
-    }
-    (void)usleep(static_cast<useconds_t>(500 * round));
-    (void)kill(writer, SIGKILL);
-    (void)waitpid(writer, nullptr, 0);
-    const std::string left = ReadFile(path);
-    ASSERT_TRUE(left == contents[0] || left == contents[1]) << left.size() << " bytes, round " << round;
-  }
 }
 
 }  // namespace ferrox

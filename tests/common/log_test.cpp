@@ -19,9 +19,7 @@ void FailWhen(bool bad_thing, int error) {
 }  // namespace
 
 TEST(ErrorTest, ReasonAndComposedText) {
-  const Error bare(Error::kInternal);
-  EXPECT_STREQ(bare.what(), "");
-  EXPECT_STREQ(bare.std::runtime_error::what(), "Ferrox error, code=502");
+  EXPECT_STREQ(Error(Error::kInternal).std::runtime_error::what(), "Ferrox error, code=502");
   const Error copy = Error(Error::kBadArgument, "x");
   EXPECT_EQ(copy.Code(), 120);
   EXPECT_STREQ(copy.what(), "x");

@@ -4,7 +4,6 @@
 #include <signal.h>
 #include <sys/resource.h>
 #include <sys/stat.h>
-#include <unistd.h>
 
 #include <cerrno>
 #include <random>
@@ -95,9 +94,6 @@ TEST_F(FolderMgrTest, UnusableFilesCannotBeLoaded) {
   for (const char* bad : {"", "[] x", "{}", "\"a\""}) {
     test::WriteFile(path_, bad);
     EXPECT_EQ(FailureOf([] { FolderMgr(); }), "504 Cannot load json: " + path_) << bad;
-    EXPECT_NE(log_.Lines().back().find("(FolderMgr) Failed [IsFileExist(kFileIndexFoldersCfgPath) && "
-                                       "!folders.fromFile(kFileIndexFoldersCfgPath)], reason: Cannot load json: /"),
-              std::string::npos);
   }
   test::WriteFile(path_, "[[]]");
   EXPECT_EQ(FailureOf([] { FolderMgr(); }).substr(0, 20), "120 Not an object, d");
@@ -105,7 +101,7 @@ TEST_F(FolderMgrTest, UnusableFilesCannotBeLoaded) {
   EXPECT_TRUE(FolderMgr().GetFolders().empty());
 }
 
-// A limit on the size of files stands for the full disk, a foreign user for the read-only folder.
+// A limit on the size of files stands for the full disk.
 TEST_F(FolderMgrTest, AFailedSaveLeavesTheOldFileOrTheNew) {
   Write({"/photo"});
   const std::string before = test::ReadFile(path_);
@@ -120,20 +116,10 @@ TEST_F(FolderMgrTest, AFailedSaveLeavesTheOldFileOrTheNew) {
   EXPECT_EQ(FailureOf(save), "505 " + path_);
   ASSERT_EQ(setrlimit(RLIMIT_FSIZE, &unlimited), 0);
   EXPECT_FALSE(fs::exists(path_ + ".new"));
-  EXPECT_TRUE(log_.Contains("(Save) Failed [!folders.toFile(kFileIndexFoldersCfgPath)], reason: " + path_ + " [err: "));
-  if (getuid() == 0) {
-    ASSERT_EQ(seteuid(65534), 0);
-    EXPECT_EQ(FailureOf(save), "505 " + path_);
-    ASSERT_EQ(seteuid(0), 0);
-  }
-  platform_.failing["ResetCredentialsByName"] = {};
-  EXPECT_EQ(FailureOf(save), "503 ");
-  platform_.failing.clear();
   EXPECT_EQ(test::ReadFile(path_), before);
   chmod_fails = true;
   EXPECT_EQ(FailureOf(save), "502 " + path_);
   chmod_fails = false;
-  EXPECT_TRUE(log_.Contains("Failed [-1 == chmod(kFileIndexFoldersCfgPath, 0644)], reason: " + path_ + " [err: "));
   EXPECT_EQ(Paths(FolderMgr().GetFolders()), "/photo /music ");
 }
 
@@ -157,9 +143,7 @@ TEST_F(FolderMgrTest, ChangesNameTheKindsThatDiffer) {
   EXPECT_EQ(Upserted(mgr, "/photo/a", "d"), "/photo/a ");
   EXPECT_EQ(Paths(mgr.GetFolders()), "/photo/a/b/c /photo/a ") << "a replaced entry stands last";
   EXPECT_EQ(Deleted(mgr, "/photo/a/b/c"), "/photo/a/b/c v");
-  errno = 0;
   EXPECT_EQ(FailureOf([&mgr] { Deleted(mgr, "/photo/a/"); }), "902 /photo/a/");
-  EXPECT_NE(log_.Lines().back().find("(Get) Failed [it == folders_.end()], reason: /photo/a/"), std::string::npos);
   EXPECT_EQ(FailureOf([&mgr] { Upserted(mgr, "/gone/a", "d"); }), "800 gone");
   EXPECT_EQ(FailureOf([&mgr] { Upserted(mgr, "photo", "d"); }), "120 ");
   EXPECT_EQ(Deleted(mgr, "/photo/a"), "/photo/a davp");
@@ -196,7 +180,6 @@ TEST_F(FolderMgrTest, AThousandFoldersAndNoMore) {
   for (int i = 0; i < 1000; ++i) (void)Upserted(mgr, "/photo/" + std::to_string(i), "d");
   EXPECT_EQ(Upserted(mgr, "/photo/0", "p"), "/photo/0 dp") << "a replacement";
   EXPECT_EQ(FailureOf([&mgr] { Upserted(mgr, "/music", "p"); }), "900 ");
-  EXPECT_TRUE(log_.Contains("(Upsert) Failed [folders_.size() > kFileIndexFoldersMax], reason: "));
   EXPECT_EQ(platform_.CallCount("KOVAShareGet"), 2) << "each share is looked up once";
 }
 

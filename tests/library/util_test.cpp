@@ -1,6 +1,5 @@
 #include "fileindex/util.h"
 
-#include <algorithm>
 #include <sstream>
 
 #include <kova/fs.h>
@@ -29,12 +28,6 @@ class UtilTest : public test::LibraryTest {
   const std::string share_ = volume_ + "/photo";
 };
 
-size_t CountOf(FileType type) {
-  size_t count = 0;
-  for (const auto& entry : GetExtensionMap()) count += entry.second == type;
-  return count;
-}
-
 }  // namespace
 
 TEST_F(UtilTest, SharePathsAndFullPaths) {
@@ -45,7 +38,6 @@ TEST_F(UtilTest, SharePathsAndFullPaths) {
   for (const char* bad : {"", "photo/a"}) {
     EXPECT_EQ(FailureOf([&] { GetShareNameByPath(bad); }), "120 ") << bad;
   }
-  EXPECT_TRUE(log_.Contains("Failed [1 > share_path.size() || '/' != share_path.at(0)]"));
   EXPECT_EQ(GetFullPath("/photo/folder/b"), share_ + "/folder/b");
   EXPECT_EQ(FailureOf([] { GetFullPath("/nope/b"); }), "800 nope");
   std::string name, path;
@@ -69,29 +61,24 @@ TEST_F(UtilTest, ReplacePathShareTouchesOneComponent) {
   for (const char* bad : {"/volume1/older/x", "old/x", "", "/Old/x"}) {
     EXPECT_EQ(FailureOf([&] { ReplacePathShare(bad, "new", "old"); }), "120 Cannot find share: old") << bad;
   }
-  EXPECT_TRUE(log_.Contains("Failed [string::npos == pos]"));
 }
 
 TEST_F(UtilTest, KindsByExtension) {
-  EXPECT_EQ(GetExtensionMap().size(), 735U);
-  EXPECT_EQ(CountOf(FILE_TYPE_DOCUMENT), 646U);
-  EXPECT_EQ(CountOf(FILE_TYPE_AUDIO), 25U);
-  EXPECT_EQ(CountOf(FILE_TYPE_VIDEO), 31U);
-  EXPECT_EQ(CountOf(FILE_TYPE_IMAGE), 33U);
+  std::map<FileType, int> counts;
   for (const auto& entry : GetExtensionMap()) {
+    ++counts[entry.second];
     EXPECT_EQ(GetFileTypeByFullPath("/x.d/f." + std::string(entry.first)), entry.second) << entry.first;
   }
+  EXPECT_EQ(counts,
+            (std::map<FileType, int>{
+                {FILE_TYPE_DOCUMENT, 646}, {FILE_TYPE_AUDIO, 25}, {FILE_TYPE_VIDEO, 31}, {FILE_TYPE_IMAGE, 33}}));
   for (const auto& [path, type] : {std::pair{"/p/a.JPG", FILE_TYPE_IMAGE},
                                    {"/p/Makefile", FILE_TYPE_DOCUMENT},
                                    {"/p/end.", FILE_TYPE_DOCUMENT},
                                    {"/p.mp3/readme", FILE_TYPE_DOCUMENT},
-                                   {"/p/a.tar.gz", FILE_TYPE_DOCUMENT},
                                    {"/p/x.unknownext", FILE_TYPE_OTHER},
-                                   {"/p/.mp3", FILE_TYPE_AUDIO},
                                    {"/p/x.adiumhtmllogadiumhtmllog", FILE_TYPE_OTHER},
                                    {"", FILE_TYPE_DOCUMENT},
-                                   {"/p/x.mpg", FILE_TYPE_VIDEO},
-                                   {"/p/x.q&a", FILE_TYPE_DOCUMENT},
                                    {"/p/x.TX?", FILE_TYPE_DOCUMENT}}) {
     EXPECT_EQ(GetFileTypeByFullPath(path), type) << path;
   }
@@ -106,11 +93,12 @@ TEST_F(UtilTest, CategoryQueriesNameEveryExtensionOfTheirKind) {
                                           {"image", 33U, FILE_TYPE_IMAGE}}) {
     std::istringstream text(queries.at(kind));
     std::string word;
-    for (size_t i = 0; text >> word; ++i) {
-      EXPECT_EQ(word == "OR", i % 2 == 1) << kind << " " << word;
+    size_t count = 0;
+    for (; text >> word; ++count) {
+      EXPECT_EQ(word == "OR", count % 2 == 1) << kind << " " << word;
       EXPECT_TRUE(type == FILE_TYPE_DOCUMENT || word == "OR" || GetExtensionMap().at(word) == type) << word;
     }
-    EXPECT_EQ(std::count(queries.at(kind).begin(), queries.at(kind).end(), ' ') / 2 + 1U, words) << kind;
+    EXPECT_EQ(count, 2 * words - 1) << kind;
   }
 }
 
@@ -134,7 +122,6 @@ TEST_F(UtilTest, WhatCanBeIndexed) {
            Row{"unconfirmed snapshot", [&] { platform_.failing["KLIBFhsPathInSnapshot"] = {}; }, true},
            Row{"remote", [&] { platform_.fs_types[share_] = KOVA_FS_NFS; }},
            Row{"image", [&] { platform_.fs_types[share_] = KOVA_FS_SQUASHFS; }},
-           Row{"type 12", [&] { platform_.fs_types[share_] = 12; }},
            Row{"no type", [&] { platform_.failing["KOVAGetFSType"] = {}; }},
            Row{"read-only share", [&] { platform_.shares["photo"].read_only = 1; }},
            Row{"locked share", [&] { platform_.shares["photo"].encrypted = 1; }},
@@ -147,8 +134,6 @@ TEST_F(UtilTest, WhatCanBeIndexed) {
     row.make();
     EXPECT_EQ(CanFullPathBeIndexed(path), row.expected) << row.what;
   }
-  SetUp();
-  EXPECT_EQ(FailureOf([&] { CanFullPathBeIndexed(volume_); }), "502 KOVAShareNamePathGet failed, full_path=" + volume_);
 }
 
 TEST_F(UtilTest, RecycleBins) {
@@ -173,18 +158,16 @@ TEST_F(UtilTest, NotificationsRunTheNotifier) {
   platform_.exec_status = -1;
   EXPECT_NO_THROW(NotifyLackOfMemory());
   ASSERT_EQ(platform_.executed.size(), 2U);
-  for (const test::FakeProgram& program : platform_.executed) {
-    EXPECT_EQ(program.path, "/usr/kova/bin/kovazemnotify");
-    EXPECT_EQ(program.options, 187U);
+  std::string arguments[2];
+  for (const int i : {0, 1}) {
+    EXPECT_EQ(platform_.executed[i].path, "/usr/kova/bin/kovazemnotify");
+    EXPECT_EQ(platform_.executed[i].options, 187U);
+    for (const std::string& argument : platform_.executed[i].arguments) arguments[i] += argument + "|";
   }
-  EXPECT_EQ(
-      platform_.executed[0].arguments,
-      (std::vector<std::string>{"-c", "KOVA.Ferrox.Application", "-b", "true", "-e", "false", "@administrators",
-                                "app:displayname", "error:index_no_space",
-                                "<a data-kova-app=\"KOVA.Ferrox.Application\" data-kova-fn=\"preference\">", "</a>"}));
-  EXPECT_EQ(platform_.executed[1].arguments,
-            (std::vector<std::string>{"-c", "KOVA.Ferrox.Application", "@administrators", "app:displayname",
-                                      "error:lack_of_memory"}));
+  EXPECT_EQ(arguments[0],
+            "-c|KOVA.Ferrox.Application|-b|true|-e|false|@administrators|app:displayname|error:index_no_space|"
+            "<a data-kova-app=\"KOVA.Ferrox.Application\" data-kova-fn=\"preference\">|</a>|");
+  EXPECT_EQ(arguments[1], "-c|KOVA.Ferrox.Application|@administrators|app:displayname|error:lack_of_memory|");
 }
 
 }  // namespace ferrox::fileindex
