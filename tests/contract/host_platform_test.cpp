@@ -5,6 +5,8 @@
 #include <unistd.h>
 
 #include <filesystem>
+#include <functional>
+#include <set>
 #include <string>
 #include <thread>
 #include <vector>
@@ -40,14 +42,17 @@ class HostPlatformTest : public testing::Test {
     std::filesystem::create_directories(dir_ / path);
     return dir_ / path;
   }
-  /// The sentence with which a share is refused; empty when it was added.
-  static string Refusal(const string& name, const string& path) {
+  /// The sentence with which a change of the table is refused; empty when it was made.
+  static string Refusal(const std::function<void()>& change) {
     try {
-      AddShare({name, path});
+      change();
     } catch (const kova::host::ShareTableError& error) {
       return error.what();
     }
     return {};
+  }
+  static string Refusal(const string& name, const string& path) {
+    return Refusal([&] { AddShare({name, path}); });
   }
 
   TempDir dir_;
@@ -120,13 +125,8 @@ TEST_F(HostPlatformTest, ARenamedOrMovedShareKeepsItsFlags) {
   entry.hide_unreadable = true;
   AddShare(entry);
   AddShare({"music", Folder("music")});
-  const auto refusal = [](const string& from, const string& name, const string& path) -> string {
-    try {
-      kova::host::RenameShare(from, name, path);
-    } catch (const kova::host::ShareTableError& error) {
-      return error.what();
-    }
-    return {};
+  const auto refusal = [](const string& from, const string& name, const string& path) {
+    return Refusal([&] { kova::host::RenameShare(from, name, path); });
   };
   const struct {
     string from, name, path, sentence;
@@ -164,6 +164,33 @@ TEST_F(HostPlatformTest, ConcurrentChangesAreAllKept) {
   }
   for (std::thread& thread : threads) thread.join();
   EXPECT_EQ(40U, ListShares().size());
+}
+
+/// The recycle bins in the homes of accounts of these kinds; of all when `kinds` is 0.
+std::set<string> HomeBins(int kinds) {
+  KLIBCSzList* list = KLIBCSzListAlloc(1);
+  const int count = kinds == 0 ? KOVARecycleHomeEnumRecyclePath(&list)
+                               : KOVARecycleHomeEnumRecyclePathForAuthType(&list, static_cast<AUTH_TYPE>(kinds));
+  std::set<string> bins;
+  for (int i = 0; i < list->count; ++i) bins.insert(KLIBCSzListGet(list, i));
+  EXPECT_EQ(count, static_cast<int>(bins.size()));
+  KLIBCSzListFree(list);
+  return bins;
+}
+
+TEST_F(HostPlatformTest, HomeRecycleBinsByTheKindOfTheirOwnersAccount) {
+  EXPECT_EQ(std::set<string>(), HomeBins(0)) << "there is no share \"homes\"";
+  const string homes = Folder("homes"), local = Folder("homes/root/#recycle");
+  const string nobodys = Folder("homes/no-such-user-here/#recycle");
+  AddShare({"homes", homes});
+  Folder("homes/daemon/recycle");
+  Folder("homes/nobody");
+  WriteFile(homes + "/bin/#recycle", "no folder");
+  std::filesystem::create_directory_symlink(homes + "/root", homes + "/sys");
+  std::filesystem::create_directory_symlink(local, homes + "/nobody/#recycle");
+  EXPECT_EQ((std::set<string>{local, nobodys}), HomeBins(0));
+  EXPECT_EQ(std::set<string>{local}, HomeBins(AUTH_LOCAL));
+  EXPECT_EQ(std::set<string>(), HomeBins(AUTH_DOMAIN | AUTH_LDAP));
 }
 
 TEST_F(HostPlatformTest, AccountsOfTheNetworkAreToldApart) {
@@ -234,6 +261,9 @@ TEST_F(HostPlatformTest, FileSystemsAreToldApart) {
   EXPECT_EQ(0, KOVAFSDirIsMntPoint(dir_.Path().c_str()));
   EXPECT_EQ(0, KOVAFSDirIsMntPoint("/proc/version"));
   EXPECT_LT(KOVAFSDirIsMntPoint((dir_ / "missing").c_str()), 0);
+  for (const int type : {KOVA_FS_CIFS, KOVA_FS_FUSE_REMOTE, KOVA_FS_OTHER_REMOTE}) EXPECT_EQ(1, KOVAFSIsRemoteFS(type));
+  for (const int type : {KOVA_FS_ISO9660, KOVA_FS_EROFS}) EXPECT_EQ(1, KOVAFSIsImageFS(type));
+  for (const int type : {KOVA_FS_FUSE, KOVA_FS_UNKNOWN}) EXPECT_EQ(0, KOVAFSIsRemoteFS(type) + KOVAFSIsImageFS(type));
 }
 
 int InSnapshot(const string& path) {

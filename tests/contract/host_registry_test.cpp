@@ -6,7 +6,10 @@
 #include <unistd.h>
 
 #include <filesystem>
+#include <functional>
+#include <set>
 #include <string>
+#include <vector>
 
 #include <gtest/gtest.h>
 
@@ -38,15 +41,30 @@ class HostRegistryTest : public testing::Test {
     document["config"] = Json::arrayValue;
     for (int i = 0; i < folders; ++i) {
       Json::Value watch;
-      watch["path"] = "/v/share/folder number " + std::to_string(i);
+      watch["path"] = "/v/" + std::to_string(i);
       watch["mask"] = 65478;
       watch["ignore"].append("@eaDir");
       document["config"].append(watch);
     }
     return document;
   }
-  static bool Upsert(const string& queue, int folders) {
-    return MonitorQueue::Upsert(MonitorQueue(Document(queue, folders)), "fileindex", 1);
+  static bool Upsert(const Json::Value& document, const string& application = "fileindex", int type = 1) {
+    return MonitorQueue::Upsert(MonitorQueue(document), application, type);
+  }
+  static bool Upsert(const string& queue, int folders) { return Upsert(Document(queue, folders)); }
+  /// "application type queue: folders" of each registration.
+  static std::multiset<string> Registered() {
+    std::multiset<string> texts;
+    for (const kova::host::Registration& registration : ReadRegistrations().list) {
+      string text = registration.application + " " + std::to_string(registration.type) + " " + registration.queue + ":";
+      for (const kova::host::Watch& watch : registration.watches) {
+        text += " " + watch.path;
+        EXPECT_EQ(65478U, watch.mask);
+        EXPECT_EQ(std::vector<string>{"@eaDir"}, watch.ignore);
+      }
+      texts.insert(text);
+    }
+    return texts;
   }
   static string OnlyFile() {
     string found;
@@ -64,6 +82,51 @@ class HostRegistryTest : public testing::Test {
 
   HostLog log_;
 };
+
+TEST_F(HostRegistryTest, AQueueIsRegisteredByItsPathApplicationAndType) {
+  const string odd = "/v/q\xff \"\\\n";
+  Json::Value document = Document("/v/q", 2);
+  document["config"][1]["path"] = odd;
+  EXPECT_TRUE(Upsert(document));
+  EXPECT_TRUE(Upsert(Document("/v/q", 0), "other"));
+  EXPECT_TRUE(Upsert(Document("/v/q", 0), "fileindex", 2));
+  EXPECT_TRUE(Upsert(odd, 0));
+  EXPECT_EQ((std::multiset<string>{"fileindex 1 /v/q: /v/0 " + odd,
+                                   "other 1 /v/q:", "fileindex 2 /v/q:", "fileindex 1 " + odd + ":"}),
+            Registered());
+  EXPECT_TRUE(Upsert("/v/q", 1)) << "in place of the first";
+  EXPECT_TRUE(MonitorQueue::Delete("/v/q", "other", 1));
+  EXPECT_TRUE(MonitorQueue::Delete("/v/q", "other", 1)) << "there is none any more";
+  EXPECT_TRUE(MonitorQueue::Delete("/v/q", "fileindex", 2));
+  EXPECT_TRUE(MonitorQueue::Delete(odd, "fileindex", 1));
+  EXPECT_EQ(std::multiset<string>{"fileindex 1 /v/q: /v/0"}, Registered());
+}
+
+TEST_F(HostRegistryTest, ABadRegistrationIsRefusedWholeAndChangesNothing) {
+  ASSERT_TRUE(Upsert("/v/q", 1));
+  const std::function<void(Json::Value&)> damages[] = {
+      [](Json::Value& d) { d = Json::nullValue; },
+      [](Json::Value& d) { d = Json::arrayValue; },
+      [](Json::Value& d) { d["queue"] = "v/q"; },
+      [](Json::Value& d) { d.removeMember("queue"); },
+      [](Json::Value& d) { d["config"] = Json::nullValue; },
+      [](Json::Value& d) { d["config"][1] = "/v/d"; },
+      [](Json::Value& d) { d["config"][1]["path"] = "v/d"; },
+      [](Json::Value& d) { d["config"][1]["path"] = string("/v/d\0e", 6); },
+      [](Json::Value& d) { d["config"][1]["mask"] = -1; },
+      [](Json::Value& d) { d["config"][1].removeMember("ignore"); },
+      [](Json::Value& d) { d["config"][1]["ignore"] = "@eaDir"; },
+      [](Json::Value& d) { d["config"][1]["ignore"].append("a/b"); },
+      [](Json::Value& d) { d["config"][1]["ignore"].append(".."); },
+  };
+  for (const auto& damage : damages) {
+    Json::Value document = Document("/v/q", 2);
+    damage(document);
+    EXPECT_FALSE(Upsert(document)) << document.toStyledString();
+    EXPECT_EQ(KOVA_ERR_BAD_PARAMETER, KLIBCErrGet());
+    EXPECT_EQ(std::multiset<string>{"fileindex 1 /v/q: /v/0"}, Registered());
+  }
+}
 
 TEST_F(HostRegistryTest, OnlyAChangeIsWritten) {
   EXPECT_TRUE(ReadRegistrations().problems.empty()) << "there is no folder yet";
@@ -117,8 +180,8 @@ TEST_F(HostRegistryTest, WhatCannotBeWrittenLeavesTheOldRegistration) {
   EXPECT_EQ(KOVA_ERR_SYSTEM, KLIBCErrGet());
   std::filesystem::remove(lock);
   EXPECT_EQ(1U, ReadRegistrations().list.at(0).watches.size());
-  EXPECT_FALSE(MonitorQueue::Upsert(MonitorQueue(Document("/q/a", 1)), "a/b", 1)) << "no name of an application";
-  EXPECT_FALSE(MonitorQueue::Upsert(MonitorQueue(Document("/q/a", 1)), "", 1));
+  EXPECT_FALSE(Upsert(Document("/q/a", 1), "a/b")) << "no name of an application";
+  EXPECT_FALSE(Upsert(Document("/q/a", 1), ""));
 }
 
 TEST_F(HostRegistryTest, AWriterThatIsKilledLeavesTheOldOrTheNew) {
