@@ -67,23 +67,6 @@ TEST(WordsTest, PlacesInTheTextAreThoseOfTheWord) {
   EXPECT_EQ(found, "x|Résumé|東京|京|");
 }
 
-TEST(WordsTest, QueriesLookForWhatDocumentsHold) {
-  const struct {
-    std::string text;
-    std::string words;
-    bool prefix;
-  } kRows[] = {{"a_b", "a b", false}, {"東京", "東京", false}, {"都", "都", true},
-               {"a東", "a 東", true}, {"東a", "東 a", false},  {"東京 x", "東京 京 x", false}};
-  for (const auto& row : kRows) {
-    SCOPED_TRACE(row.text);
-    const QueryWords words = SplitQueryText(row.text, false);
-    std::string joined;
-    for (const std::string& word : words.words) joined += (joined.empty() ? "" : " ") + word;
-    EXPECT_EQ(joined, row.words);
-    EXPECT_EQ(words.prefix, row.prefix);
-  }
-}
-
 TEST(WordsTest, TrigramsCoverTheFoldedText) {
   EXPECT_EQ(Trigrams("ab", 10).size(), 0U);
   EXPECT_EQ(Trigrams("Été.", 10), (std::vector<std::string>{"ete", "te."}));
