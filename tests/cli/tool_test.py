@@ -1,4 +1,4 @@
-"""The tool on an instance without daemons: usage, paths, completion."""
+"""The tool on an instance without daemons: usage, remedies, paths, completion."""
 
 import json
 import os
@@ -86,18 +86,38 @@ class ToolTest(unittest.TestCase):
         status = json.loads(self.run_tool("status", "--json").stdout)
         self.assertIn("(error 504)", status["problem"])
 
-    def test_usage_is_checked_before_anything_is_done(self):
-        rows = [("--kinds takes", ["folder", "add", "--kinds", "music", "/photo"]),
-                ("--kinds is needed", ["folder", "set", "/photo"]), ("--name goes with one", ["folder", "add", "/photo",
-                                                                                           "/photos", "--name", "x"]),
-                ("--sort takes one of", ["folder", "list", "--sort", "size"]), ("missing", ["share", "rename", "a"]),
-                ("too many", ["share", "rename", "a", "b", "c"]), ("--accounts takes", ["home", "enable", "--accounts", "x"]),
-                ("cannot be a share's name", ["share", "rename", "photo", "a/b"]), ("add, delete, get", ["folder", "nonsense"]),
-                ("no command", ["nonsense", "add"])]
-        for text, words in rows:
+    def test_exit_codes_and_remedies(self):
+        rows = [
+            (2, "Try", []),
+            (2, "no command", ["nonsense", "add"]),
+            (2, "add, delete, get", ["folder", "nonsense"]),
+            (2, "--kinds takes", ["folder", "add", "--kinds", "music", "/photo"]),
+            (2, "--kinds is needed", ["folder", "set", "/photo"]),
+            (2, "--name goes with one", ["folder", "add", "/photo", "/photos", "--name", "x"]),
+            (2, "--sort takes one of", ["folder", "list", "--sort", "size"]),
+            (2, "missing", ["share", "rename", "a"]),
+            (2, "too many", ["share", "rename", "a", "b", "c"]),
+            (2, "too many", ["prepare", "x"]),
+            (2, "missing", ["folder", "delete"]),
+            (2, "cannot be a share's name", ["share", "rename", "photo", "a/b"]),
+            (2, "--accounts takes", ["home", "enable", "--accounts", "x"]),
+            (2, "--limit", ["search", "--limit", "0", "x"]),
+            (3, "fileindexctl up", ["search", "x"]),
+            (3, "share list", ["search", "--share", "nonexistent", "x"]),
+            (3, "share list", ["index", "nonexistent"]),
+            (3, "share list", ["share", "remove", "nonexistent"]),
+            (3, "No such file", ["queue", "show", "/nonexistent"]),
+            (3, "no such folder", ["share", "add", "/nonexistent"]),
+            (3, "mount --bind", ["share", "add", "/usr/share", "--name", "other"]),
+            (3, "too long", ["--root", "/tmp/" + "x" * 100, "status"]),
+            (1, "share add", ["--root", f"{self.root}/none", "share", "list"]),
+            (0, "", ["--help"]),
+            (0, "", ["--version"]),
+        ]
+        for code, text, words in rows:
             with self.subTest(words=words):
                 done = self.run_tool(*words)
-                self.assertEqual(2, done.returncode, done.stderr)
+                self.assertEqual(code, done.returncode, done.stderr)
                 self.assertIn(text, done.stderr.decode())
 
     def test_every_command_has_help_and_stands_in_the_manual(self):

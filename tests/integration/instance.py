@@ -10,6 +10,7 @@ import struct
 import subprocess
 import tempfile
 import time
+import unittest
 
 BIN = os.environ.get("FERROX_BIN", "")
 TIMEOUT = 120
@@ -154,6 +155,25 @@ class Instance:
             files = [self.queue_path(folder), self.queue_path(folder) + ".tmp"]
             return state["state"] == "idle" and not any(os.path.exists(f) and os.path.getsize(f) for f in files)
         wait_for(idle, f"share {share} to be idle")
+
+
+class InstanceTestCase(unittest.TestCase):
+    """Each case has an instance of its own, and leaves no process behind."""
+
+    def setUp(self):
+        self.instance = Instance()
+        self.ctl = self.instance.ctl
+        self.addCleanup(self.stop)
+
+    def stop(self):
+        left = self.instance.stop()
+        self.assertEqual([], left, "processes that 'down' left running")
+
+
+def write(path, text):
+    os.makedirs(os.path.dirname(path), exist_ok=True)
+    with open(path, "wb") as file:
+        file.write(text.encode() if isinstance(text, str) else text)
 
 
 def event(bits, path, path_old="", is_dir=False):

@@ -11,7 +11,7 @@ import tempfile
 import time
 import unittest
 
-from instance import CREATE, DELETE, MODIFY, RENAME, Instance, event, wait_for
+from instance import CREATE, DELETE, MODIFY, RENAME, Instance, event, wait_for, write
 
 CHECKPOINTS = 3
 CHANGES = 14
@@ -21,12 +21,6 @@ KINDS = ["document", "audio", "video", "photo"]
 FIELDS = ["KOVAMDPath", "KOVAMDParent", "KOVAMDFSName", "KOVAMDSearchFileName", "KOVAMDDisplayName", "KOVAMDKind",
           "KOVAMDExtension", "KOVAMDIsDir", "KOVAMDFSSize", "KOVAMDContentType", "KOVAMDTextContent", "_KOVAStamp",
           "_KOVANeedMeta", "_KOVAExtractError", "_KOVATextEncoding"]
-
-
-def write(path, text):
-    os.makedirs(os.path.dirname(path), exist_ok=True)
-    with open(path, "w", encoding="ascii") as file:
-        file.write(text)
 
 
 class World:
@@ -57,8 +51,11 @@ class World:
 
     def fill(self, folder):
         for name in NAMES:
-            self.number += 1
-            write(f"{folder}/{name}", f"text {self.number}")
+            write(f"{folder}/{name}", f"text {self.next()}")
+
+    def next(self):
+        self.number += 1
+        return self.number
 
     def tell(self, share, *events):
         self.log += [json.dumps(e) for e in events]
@@ -115,14 +112,12 @@ class World:
     def modify_file(self):
         share = self.some_share()
         path = f"{self.some_folder(share)}/{self.random.choice(NAMES)}"
-        self.number += 1
-        write(path, f"changed {self.number}")
+        write(path, f"changed {self.next()}")
         self.tell(share, event(MODIFY, path), event(CREATE, path))
 
     def make_folder(self):
         share = self.some_share()
-        self.number += 1
-        path = f"{self.some_folder(share)}/new{self.number}"
+        path = f"{self.some_folder(share)}/new{self.next()}"
         self.fill(path)
         self.tell(share, event(CREATE, path, "", True))
 
@@ -131,8 +126,7 @@ class World:
         old, target = self.some_folder(share), self.some_folder(share)
         if old == self.shares[share] or (target + "/").startswith(old + "/"):
             return
-        self.number += 1
-        new = f"{target}/" + self.random.choice([f"moved{self.number}", "anna", "bert"])
+        new = f"{target}/" + self.random.choice([f"moved{self.next()}", "anna", "bert"])
         if os.path.exists(new):
             return
         os.rename(old, new)
@@ -150,8 +144,7 @@ class World:
         os.rename(old, new)
         events = [event(RENAME, new, old)]
         if self.random.random() < 0.3:
-            self.number += 1
-            write(old, f"back {self.number}")
+            write(old, f"back {self.next()}")
             events.append(event(CREATE, old))
         self.tell(share, *events)
 
@@ -168,16 +161,14 @@ class World:
 
     def rename_share(self):
         old = self.random.choice([name for name in sorted(self.shares) if name != "homes"])
-        self.number += 1
-        new = f"share{self.number}"
+        new = f"share{self.next()}"
         self.ctl("share", "rename", old, new)
         self.shares[new] = f"{os.path.dirname(self.shares.pop(old))}/{new}"
 
     def migrate(self):
         share = self.some_share()
         old = self.shares[share]
-        self.number += 1
-        new = f"{self.random.choice(self.volumes)}/{self.number}/{share}"
+        new = f"{self.random.choice(self.volumes)}/{self.next()}/{share}"
         os.makedirs(os.path.dirname(new))
         shutil.move(old, new)
         self.ctl("share", "migrate", share, new)
@@ -206,9 +197,8 @@ class World:
 
     def rename_user(self):
         homes = self.shares["homes"]
-        self.number += 1
         old = self.random.choice([name for name in sorted(os.listdir(homes)) if os.path.isdir(f"{homes}/{name}")] or [""])
-        new = f"user{self.number}"
+        new = f"user{self.next()}"
         if not old or old.startswith("#"):
             return
         os.rename(f"{homes}/{old}", f"{homes}/{new}")
