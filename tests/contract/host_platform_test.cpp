@@ -264,6 +264,7 @@ TEST_F(HostPlatformTest, FileSystemsAreToldApart) {
   for (const int type : {KOVA_FS_CIFS, KOVA_FS_FUSE_REMOTE, KOVA_FS_OTHER_REMOTE}) EXPECT_EQ(1, KOVAFSIsRemoteFS(type));
   for (const int type : {KOVA_FS_ISO9660, KOVA_FS_EROFS}) EXPECT_EQ(1, KOVAFSIsImageFS(type));
   for (const int type : {KOVA_FS_FUSE, KOVA_FS_UNKNOWN}) EXPECT_EQ(0, KOVAFSIsRemoteFS(type) + KOVAFSIsImageFS(type));
+  EXPECT_TRUE(KOVAEAIsHiddenDir("@eaDir") == 1 && KOVAEAIsHiddenDir("@eadir") == 0);
 }
 
 int InSnapshot(const string& path) {

@@ -15,6 +15,12 @@ namespace {
 std::atomic<bool> g_ready{false};
 std::mutex g_calls_mutex;
 
+uint32_t Effective(int (*get)(uint32_t*, uint32_t*, uint32_t*)) {
+  uint32_t real = 0, effective = 0, saved = 0;
+  (void)get(&real, &effective, &saved);
+  return effective;
+}
+
 }  // namespace
 
 FakePlatform& FakePlatform::Get() {
@@ -29,12 +35,8 @@ FakePlatform& FakePlatform::Get() {
 
 void FakePlatform::Reset() {
   *this = FakePlatform();
-  uid_t real = 0, effective = 0, saved = 0;
-  gid_t real_group = 0, effective_group = 0, saved_group = 0;
-  (void)getresuid(&real, &effective, &saved);
-  (void)getresgid(&real_group, &effective_group, &saved_group);
-  euid = effective;
-  egid = effective_group;
+  euid = Effective(&getresuid);
+  egid = Effective(&getresgid);
   users["root"] = {0, 0, true, "/root", 0};
   if (euid != 0) users["owner"] = {euid, egid, false, "/home/owner", 0};
 }
@@ -49,14 +51,12 @@ int FakePlatform::CallCount(const std::string& function) const {
   }));
 }
 
-bool FakeCallFails(const char* function, const std::string& arguments) {
-  FakePlatform& platform = FakePlatform::Get();
-  const std::string call = std::string(function) + "(" + arguments + ")";
-  if (platform.on_call) platform.on_call(call);
+bool FakePlatform::Fails(const std::string& function, const std::string& call) {
+  if (on_call) on_call(call);
   const std::lock_guard<std::mutex> guard(g_calls_mutex);
-  platform.calls.push_back(call);
-  const auto found = platform.failing.find(function);
-  if (found == platform.failing.end()) return false;
+  calls.push_back(call);
+  const auto found = failing.find(function);
+  if (found == failing.end()) return false;
   FakeFailure& failure = found->second;
   if (failure.skip > 0) {
     --failure.skip;
@@ -72,15 +72,8 @@ bool FakeCallFails(const char* function, const std::string& arguments) {
 
 // The identity that the code under test sees, in place of the C library's. Sanitizers ask before main.
 extern "C" uid_t geteuid() noexcept {
-  uid_t real = 0, effective = 0, saved = 0;
-  if (ferrox::test::g_ready) return ferrox::test::FakePlatform::Get().euid;
-  (void)getresuid(&real, &effective, &saved);
-  return effective;
+  return ferrox::test::g_ready ? ferrox::test::FakePlatform::Get().euid : ferrox::test::Effective(&getresuid);
 }
-
 extern "C" gid_t getegid() noexcept {
-  gid_t real = 0, effective = 0, saved = 0;
-  if (ferrox::test::g_ready) return ferrox::test::FakePlatform::Get().egid;
-  (void)getresgid(&real, &effective, &saved);
-  return effective;
+  return ferrox::test::g_ready ? ferrox::test::FakePlatform::Get().egid : ferrox::test::Effective(&getresgid);
 }
