@@ -1,8 +1,6 @@
 // Random changes and queries: the index and a naive model, which looks at every document, must agree on what is found.
-#include <functional>
 #include <map>
 #include <random>
-#include <set>
 #include <string>
 
 #include <gtest/gtest.h>
@@ -30,15 +28,10 @@ std::vector<std::string> WordsOf(const std::string& text) {
 
 bool HasSequence(const std::string& text, const std::vector<std::string>& sequence, bool prefix) {
   const std::vector<std::string> words = WordsOf(text);
-  for (size_t at = 0; at + sequence.size() <= words.size(); ++at) {
-    bool all = true;
-    for (size_t i = 0; i < sequence.size() && all; ++i) {
-      const bool last = i + 1 == sequence.size();
-      all = words[at + i] == sequence[i] || (prefix && last && words[at + i].rfind(sequence[i], 0) == 0);
-    }
-    if (all) return true;
-  }
-  return false;
+  const auto same = [&](const std::string& word, const std::string& wanted) {
+    return word == wanted || (prefix && &wanted == &sequence.back() && word.rfind(wanted, 0) == 0);
+  };
+  return std::search(words.begin(), words.end(), sequence.begin(), sequence.end(), same) != words.end();
 }
 
 /// Whether a document is found, decided condition by condition, without any index.
@@ -88,24 +81,15 @@ class SearchModelTest : public testing::Test {
     return text;
   }
   std::string Condition() {
-    switch (Random(9)) {
-      case 0:
-        return "\"" + Word() + " " + Word() + "\"";
-      case 1:
-        return std::string(Random(2) == 0 ? "al" : "bet") + "*";
-      case 2:
-        return "name:" + Word();
-      case 3:
-        return std::string("ext:") + (Random(2) == 0 ? "txt" : "jpg");
-      case 4:
-        return "path:/v/d" + std::to_string(Random(3));
-      case 5:
-        return "size:>" + std::to_string(Random(60));
-      case 6:
-        return "date:20" + std::to_string(20 + Random(4));
-      default:
-        return Word();
-    }
+    const std::string conditions[] = {"\"" + Word() + " " + Word() + "\"",
+                                      Random(2) == 0 ? "al*" : "bet*",
+                                      "name:" + Word(),
+                                      Random(2) == 0 ? "ext:txt" : "ext:jpg",
+                                      "path:/v/d" + std::to_string(Random(3)),
+                                      "size:>" + std::to_string(Random(60)),
+                                      "date:20" + std::to_string(20 + Random(4))};
+    const size_t choice = Random(9);
+    return choice < std::size(conditions) ? conditions[choice] : Word();
   }
   std::string Query() {
     std::string query;

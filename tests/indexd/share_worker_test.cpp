@@ -48,13 +48,17 @@ TEST_F(ShareWorkerTest, CopiedTreeIsComparedOnce) {
 
 TEST_F(ShareWorkerTest, WhatIsNotIndexedIsTakenOut) {
   fs::create_symlink("/etc/passwd", At("x"));
-  test::WriteFile(At(".DS_Store"), "x");
-  test::WriteFile(folder / "x", "x");
   fs::create_directory_symlink(folder.Path(), At("link"));
+  for (const std::string& file : {folder / "x", At(".DS_Store"), At("#recycle/x")}) {
+    test::WriteFile(file, "x");
+  }
   std::string lines;
-  for (const char* name : {"x", ".DS_Store", "link", "link/x"})
+  for (const char* name : {"x", ".DS_Store", "link", "link/x"}) {
     lines += Line(kCreate, At(name)) + Line(kAttr, At(name));
+  }
   Process(lines);
+  EXPECT_EQ(std::set<std::string>{}, Indexed());
+  Process(Line(kReindex, root));
   EXPECT_EQ(std::set<std::string>{}, Indexed());
 }
 

@@ -60,7 +60,7 @@ class WorkerTest : public testing::Test {
     share = "s" + std::to_string(++last_share);
     root = fs::canonical(folder.Path()).string() + "/" + share;
     fs::create_directory(root);
-    kova::host::AddShare({share, root});
+    kova::host::AddShare({share, root, "#recycle"});
     queue_path = sdk::SDKShare(share).GetQueuePath();
     SetFolders({{"", "davp"}});
     worker = MakeWorker();
