@@ -15,7 +15,7 @@ import unittest
 BIN = os.environ.get("FERROX_BIN", "")
 TIMEOUT = 120
 
-CREATE, MODIFY, ATTR, DELETE, RENAME, REINDEX = 0x40, 0x2, 0x4, 0x80, 0x100, 0x10000
+CREATE, MODIFY, DELETE, RENAME = 0x40, 0x2, 0x80, 0x100
 
 
 class Instance:
@@ -86,17 +86,15 @@ class Instance:
         os.kill(pid, signal.SIGKILL)
         wait_for(lambda: is_free(f"{self.root}/var/run/{program}.pid"), f"the end of {program}")
 
-    def connect(self, daemon):
-        connection = socket.socket(socket.AF_UNIX)
-        connection.settimeout(TIMEOUT)
-        connection.connect(f"{self.root}/var/run/{daemon}.sock")
-        return connection
-
     def ask(self, daemon, request, end=b""):
-        with self.connect(daemon) as connection:
-            body = json.dumps(request, ensure_ascii=False).encode("utf-8", "surrogateescape") + end
+        with socket.socket(socket.AF_UNIX) as connection:
+            connection.settimeout(TIMEOUT)
+            connection.connect(f"{self.root}/var/run/{daemon}.sock")
+            body = to_bytes(request) + end
             connection.sendall(struct.pack("=I", len(body)) + body)
-            return json.loads(receive(connection).decode("utf-8", "surrogateescape"))
+            with connection.makefile("rb") as stream:
+                (length,) = struct.unpack("=I", stream.read(4))
+                return json.loads(stream.read(length).decode("utf-8", "surrogateescape"))
 
     def entries(self, share, folder, *fields):
         """The named fields of all documents below a folder ("": of all), in the index's order."""
@@ -132,8 +130,7 @@ class Instance:
         return f"{self.root}/var/lib/kova/fileindex/queue/{name}.queue"
 
     def queue(self, folder, *lines):
-        """Appends lines (bytes, or dicts) as the notification daemon does: under the lock of the file that is still
-        the queue."""
+        """Appends lines as the notification daemon does: under the lock of the file that is still the queue."""
         path = self.queue_path(folder)
         while True:
             with open(path, "ab") as file:
@@ -143,10 +140,7 @@ class Instance:
                         continue
                 except FileNotFoundError:
                     continue
-                for line in lines:
-                    raw = line if isinstance(line, bytes) else json.dumps(line, ensure_ascii=False).encode(
-                        "utf-8", "surrogateescape")
-                    file.write(raw + b"\n")
+                file.write(b"".join(to_bytes(line) + b"\n" for line in lines))
                 return
 
     def wait_idle(self, share, folder):
@@ -176,6 +170,11 @@ def write(path, text):
         file.write(text.encode() if isinstance(text, str) else text)
 
 
+def to_bytes(value):
+    """One line of JSON; names keep the bytes that are no UTF-8."""
+    return json.dumps(value, ensure_ascii=False).encode("utf-8", "surrogateescape")
+
+
 def event(bits, path, path_old="", is_dir=False):
     return {"event": bits, "path": path, "path_old": path_old, "is_dir": is_dir}
 
@@ -188,18 +187,6 @@ def is_free(path):
         except BlockingIOError:
             return False
     return True
-
-
-def receive(connection):
-    def exactly(size):
-        data = b""
-        while len(data) < size:
-            part = connection.recv(size - len(data))
-            if not part:
-                raise EOFError
-            data += part
-        return data
-    return exactly(struct.unpack("=I", exactly(4))[0])
 
 
 def wait_for(condition, what, seconds=TIMEOUT):

@@ -69,16 +69,11 @@ class World:
     def indexed_shares(self):
         return sorted({folder["path"].split("/")[1] for folder in self.instance.folders()})
 
-    def folders_of(self, share):
-        root = self.shares[share]
-        return sorted(os.path.join(parent, name) for parent, names, _ in os.walk(root) for name in names
-                      if "#recycle" not in os.path.join(parent, name))
-
     def some_folder(self, share):
-        return self.random.choice(self.folders_of(share) or [self.shares[share]])
-
-    def share_path(self, share, full_path):
-        return "/" + share + full_path[len(self.shares[share]):]
+        root = self.shares[share]
+        folders = sorted(os.path.join(parent, name) for parent, names, _ in os.walk(root) for name in names
+                         if "#recycle" not in os.path.join(parent, name))
+        return self.random.choice(folders or [root])
 
     def kinds(self):
         return ",".join(kind for kind in KINDS if self.random.random() < 0.5) or "none"
@@ -97,7 +92,7 @@ class World:
     def folder_set(self):
         share = self.some_share()
         folder = self.random.choice([self.some_folder(share), self.shares[share]])
-        path = self.share_path(share, folder)
+        path = "/" + share + folder[len(self.shares[share]):]
         known = any(configured["path"] == path for configured in self.instance.folders())
         self.ctl("folder", "set" if known else "add", path, "--kinds", self.kinds())
 
@@ -124,28 +119,23 @@ class World:
     def move_folder(self):
         share = self.some_share()
         old, target = self.some_folder(share), self.some_folder(share)
-        if old == self.shares[share] or (target + "/").startswith(old + "/"):
-            return
         new = f"{target}/" + self.random.choice([f"moved{self.next()}", "anna", "bert"])
-        if os.path.exists(new):
-            return
-        os.rename(old, new)
-        events = [event(RENAME, new, old, True)]
-        if self.random.random() < 0.3:  # the old name is used again
-            self.fill(old)
-            events.append(event(CREATE, old, "", True))
-        self.tell(share, *events)
+        if old != self.shares[share] and not (target + "/").startswith(old + "/") and not os.path.exists(new):
+            self.move(share, new, old, self.fill)
 
     def move_file(self):
         share = self.some_share()
         old, new = (f"{self.some_folder(share)}/{self.random.choice(NAMES)}" for _ in range(2))
-        if not os.path.exists(old) or old == new:
-            return
+        if os.path.exists(old) and old != new:
+            self.move(share, new, old, lambda path: write(path, f"back {self.next()}"))
+
+    def move(self, share, new, old, make_again):
+        is_folder = os.path.isdir(old)
         os.rename(old, new)
-        events = [event(RENAME, new, old)]
-        if self.random.random() < 0.3:
-            write(old, f"back {self.next()}")
-            events.append(event(CREATE, old))
+        events = [event(RENAME, new, old, is_folder)]
+        if self.random.random() < 0.3:  # the old name is used again
+            make_again(old)
+            events.append(event(CREATE, old, "", is_folder))
         self.tell(share, *events)
 
     def remove(self):
