@@ -39,8 +39,8 @@ TEST(JsonTextTest, OneValueIsTheWholeText) {
   for (const char* good : {"{}", " [1] \n", "null", "7", "\"x\"", "{\"a\":\"\xff\xfe raw\"}"}) {
     EXPECT_TRUE(fromString(value, good)) << good;
   }
-  for (const std::string& bad : {std::string(), std::string("{}x"), std::string("{} {}"), std::string("{'a':1}"),
-                                 std::string("[1,]"), std::string("// c\n1"), std::string(2000, '[')}) {
+  for (const std::string& bad :
+       std::vector<std::string>{"", "{}x", "{} {}", "{'a':1}", "[1,]", "// c\n1", std::string(2000, '[')}) {
     value = 1;
     EXPECT_FALSE(fromString(value, bad)) << bad;
     EXPECT_TRUE(value.isNull()) << bad;
@@ -102,7 +102,6 @@ TEST(JsonApplyChangesTest, MergesObjectsOnly) {
   for (const Row& row : {
            Row{R"({"a":1,"b":2})", R"({"a":null,"z":null})", R"({"b":2})"},
            Row{R"({"o":{"x":1,"y":2}})", R"({"o":{"y":3,"n":{"d":1}}})", R"({"o":{"n":{"d":1},"x":1,"y":3}})"},
-           Row{R"({"l":[1,2,3]})", R"({"l":[4]})", R"({"l":[4]})"},
            Row{R"({"o":5})", R"({"o":{"x":1}})", R"({"o":{"x":1}})"},
            Row{R"({"a":1})", R"([1])", R"({"a":1})"},
        }) {

@@ -10,16 +10,12 @@
 #include "common/mutex.h"
 #include "tests/support/library_test.h"
 
-namespace ferrox::test_lock {
-
-std::function<void()> g_before_flock;
-
-}  // namespace ferrox::test_lock
+static std::function<void()> g_before_flock;
 
 /// The system's call, with a moment before it that a test can use once.
 extern "C" int HookedFlock(int fd, int operation) noexcept asm("flock");
 int HookedFlock(int fd, int operation) noexcept {
-  if (const auto before = std::exchange(ferrox::test_lock::g_before_flock, nullptr)) before();
+  if (const auto before = std::exchange(g_before_flock, nullptr)) before();
   return static_cast<int>(syscall(SYS_flock, fd, operation));
 }
 
@@ -58,7 +54,6 @@ TEST_F(LockFileTest, IsWaitedForAtMost64Times) {
 
 TEST_F(LockFileTest, OnlyARegularFileCanBeALock) {
   EXPECT_EQ(Failure("no/lock"), "506 open failed, path=" + dir_ / "no/lock" + ", reason=No such file or directory");
-  EXPECT_TRUE(log_.Contains("Failed [0 > (fd_ = open(path_.c_str(), O_RDONLY | O_CREAT, 0644))], reason: open failed"));
   std::filesystem::create_symlink(dir_ / "target", dir_ / "link");
   EXPECT_EQ(Failure("link").rfind("506 open failed, path=", 0), 0U);
   EXPECT_FALSE(std::filesystem::exists(dir_ / "target")) << "the link was followed";
@@ -70,7 +65,7 @@ TEST_F(LockFileTest, OnlyARegularFileCanBeALock) {
 TEST_F(LockFileTest, ALockOnAFileThatWasRenamedAwayDoesNotCount) {
   const std::string queue = dir_ / "queue";
   test::WriteFile(queue, "line\n");
-  test_lock::g_before_flock = [&] { std::filesystem::rename(queue, queue + ".tmp"); };
+  g_before_flock = [&] { std::filesystem::rename(queue, queue + ".tmp"); };
   const LockFile lock(queue, true);
   EXPECT_EQ(InodeOf("/proc/self/fd/" + std::to_string(lock.Descriptor())), InodeOf(queue));
   EXPECT_TRUE(clock_.sleeps.empty()) << "there is nothing to wait for";

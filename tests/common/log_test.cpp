@@ -48,9 +48,4 @@ TEST(LogTest, NoTextCanForgeALine) {
   EXPECT_EQ(log.Lines()[1].size(), 8191U);
 }
 
-TEST(PathsTest, FixedPathsLieBelowTheInstanceRoot) {
-  EXPECT_EQ(InstancePath("/var/run/x"), test::TestRoot() + "/var/run/x");
-  EXPECT_EQ(InstanceRootProblem(), "");
-}
-
 }  // namespace ferrox
