@@ -177,13 +177,12 @@ TEST_F(PlatformContractTest, NoTwoSharesHaveTheSameIndexFiles) {
 
 TEST_F(PlatformContractTest, RootIsAUserAndAnAdministrator) {
   KOVAUser* user = nullptr;
-  ASSERT_GE(KOVAUserGet("root", &user), 0);
-  EXPECT_EQ(0U, user->uid);
-  EXPECT_EQ("root", string(user->name));
-  KOVAUserFree(user);
-  ASSERT_GE(KOVAUserGetByUID(0, &user), 0);
-  EXPECT_EQ("root", string(user->name));
-  KOVAUserFree(user);
+  for (const bool by_name : {true, false}) {
+    ASSERT_GE(by_name ? KOVAUserGet("root", &user) : KOVAUserGetByUID(0, &user), 0);
+    EXPECT_EQ("root", string(user->name));
+    EXPECT_EQ(0U, user->uid);
+    KOVAUserFree(user);
+  }
   EXPECT_EQ(1, KLIBGroupIsAdminGroupMem("root", 0));
   EXPECT_LT(KOVAUserGet("no-such-user-here", &user), 0);
   EXPECT_EQ(KOVA_ERR_NO_SUCH_USER, KLIBCErrGet());
