@@ -33,7 +33,6 @@ TEST(OPTreeTest, Folding) {
   } kCases[] = {
       {"changes of one file are one upsert", {Create("/v/f"), Modify("/v/f"), Attr("/v/f")}, "[02] /v/f\n"},
       {"a created file may have been indexed before", {Create("/v/f"), Delete("/v/f")}, "[01] /v/f\n"},
-      {"a modify after a delete is dropped", {Delete("/v/f"), Modify("/v/f")}, "[01] /v/f\n"},
       {"flags add up",
        {UpdateCfg("/v", "audio"), UpdateCfg("/v", "video"), UpdateCfg("/v", "audio", false)},
        "[04] /v, data={\"audio\":true,\"document\":false,\"photo\":false,\"video\":true}\n"},
@@ -44,7 +43,6 @@ TEST(OPTreeTest, Folding) {
       {"a reindex covers what lies below",
        {Create("/v/a/x"), Rename("/v/o", "/v/a/r"), Create("/v/a/y/z"), Create("/v/ab"), Reindex("/v/a")},
        "[05] /v/o -> /v/a/r\n[02] /v/ab\n[06] /v/a\n"},
-      {"a dropped reindex covers it too", {Delete("/v/a"), Create("/v/a/x"), Reindex("/v/a")}, "[01] /v/a\n"},
       {"a folder's rename takes all but deletes along",
        {Modify("/a/b/f"), Delete("/a/b/g"), Rename("/a", "/z")},
        "[02] /z/b/f\n[01] /a/b/g\n[05] /a -> /z\n"},
@@ -131,21 +129,6 @@ TEST_F(OPTreeNodesTest, DeepPathsNeedNoStack) {
     kept = tree.GetNodeByPath(deep);
   }
   EXPECT_EQ(kept->GetPath(), deep);
-}
-
-TEST_F(OPTreeNodesTest, FolderEventsVisitOnlyWhatIsPending) {
-  OPTree tree(dir_ / "empty");
-  for (int i = 0; i < 100000; ++i) tree.GetNodeByPath("/d/" + std::to_string(i));
-  for (int i = 0; i < 1000; ++i) {
-    const std::string from = i % 2 == 0 ? "/d" : "/e";
-    const std::string to = i % 2 == 0 ? "/e" : "/d";
-    tree.InsertEvent(newClass<Event>(Modify(from + "/" + std::to_string(i))));
-    tree.InsertEvent(newClass<Event>(Rename(from, to)));
-    tree.InsertEvent(newClass<Event>(Reindex(to)));
-  }
-  int upserts = 0;
-  tree.ProcessOP([&upserts](std::shared_ptr<OP> op) { upserts += op->op == OP_UPSERT; });
-  EXPECT_EQ(upserts, 0);
 }
 
 TEST_F(OPTreeNodesTest, TextForms) {
