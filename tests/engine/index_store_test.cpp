@@ -53,6 +53,7 @@ TEST_F(IndexStoreTest, DocumentsAreFoundByAllTheirParts) {
                             "東京",
                             "v2東京",
                             "話",
+                            "京",
                             "京都",
                             "report_2024",
                             "por name:2024",
@@ -145,6 +146,22 @@ TEST_F(IndexStoreTest, ListsArePagedInTheOrderOfPathBytes) {
   EXPECT_EQ(List({"", "/v/", "/v/a", 2, {}}), "/v/a/1|/v/b|");
   EXPECT_EQ(List({"", "/v/", "/v/a/1", 0, {}}), "");
   EXPECT_EQ(Load("/v/b", {"KOVAMDFSName", "KOVAMDTitle"}).size(), 1U);
+}
+
+TEST_F(IndexStoreTest, RollbackForgetsAndCommitLasts) {
+  Put("/v/kept", "first words");
+  store_->Commit();
+  Put("/v/kept", "second words");
+  Put("/v/gone", "second words");
+  store_->Rollback();
+  Put("/v/next", "third words");
+  store_->Commit();
+  Put("/v/uncommitted", "second words");
+  Reopen();
+  EXPECT_EQ(ListPrefix("/v/"), "/v/kept|/v/next|");
+  EXPECT_EQ(FindPaths(*store_, "first"), "/v/kept");
+  EXPECT_EQ(FindPaths(*store_, "second"), "");
+  EXPECT_EQ(store_->Stat().documents, 2);
 }
 
 // Of few, the keys are fetched and sorted; of many they are not, nor are conditions checked one by one.
