@@ -72,6 +72,20 @@ class DaemonsTest(InstanceTestCase):
 
     # Interruptions.
 
+    def test_killed_daemons_take_up_where_they_were(self):
+        folder = self.up_with_share(3000)
+        for program in ("fileindexd", "kovaelasticd", "fileindexd"):
+            before = self.docs()["index"]["documents"]
+            self.ctl("index", "docs")
+            wait_for(lambda: self.docs()["index"]["documents"] != before or self.docs()["state"] == "idle",
+                     "the index to grow")
+            self.instance.kill(program)
+            self.ctl("up")
+            wait_for(lambda: self.docs()["state"] != "starting", "the daemon to work")
+        self.ctl("index", "docs", "--wait")
+        self.expect_index_is_disk(folder)
+        self.assertEqual(1, len(self.instance.search("number2999")))
+
     def test_pause_stops_at_once_and_resume_goes_on(self):
         folder = self.up_in_the_middle_of_indexing()
         self.ctl("pause", "1")

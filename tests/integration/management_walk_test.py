@@ -3,7 +3,9 @@ be done."""
 
 import json
 import os
+import signal
 import subprocess
+import time
 import unittest
 
 from instance import BIN, CREATE, InstanceTestCase, event, on_disk, wait_for, write
@@ -247,6 +249,32 @@ class ManagementWalkTest(InstanceTestCase):
         self.expect_refused(913, "folder", "delete", "/docs", text="fileindexctl up")
         self.expect_refused(913, "share", "rename", "docs", "papers", text="fileindexctl up")
         self.assertTrue(os.path.isdir(docs))
+
+    def test_changes_at_once_all_land_and_a_killed_one_tears_nothing(self):
+        self.ctl("up")
+        docs = self.share_without_folders("docs")
+        for number in range(40):
+            os.makedirs(f"{docs}/d{number}")
+
+        def add(number):
+            return subprocess.Popen([os.path.join(BIN, "fileindexctl"), "folder", "add", f"/docs/d{number}"],
+                                    env=self.instance.env, stdout=subprocess.DEVNULL, stderr=subprocess.PIPE)
+        running = [add(number) for number in range(20)]
+        for process in running:
+            self.assertEqual((b"", 0), (process.communicate(timeout=100)[1], process.returncode))
+        self.assertEqual({f"/docs/d{number}" for number in range(20)}, {f["path"] for f in self.instance.folders()})
+        for number in range(20, 40):
+            process = add(number)
+            time.sleep((number - 20) * 0.002)
+            process.send_signal(signal.SIGKILL)
+            process.communicate()
+            self.assertGreaterEqual(len(self.instance.folders()), 20)
+        present = [int(f["path"][len("/docs/d"):]) for f in self.instance.folders()]
+        missing = [number for number in range(40) if number not in present]
+        if missing:
+            self.ctl("folder", "add", *(f"/docs/d{number}" for number in missing))
+        # Also those whose sender was killed when they were saved, but not yet told of.
+        self.expect_documents("docs", docs, *(f"{docs}/d{number}" for number in range(40)))
 
     def test_share_that_samba_renames_and_moves(self):
         testparm, sections = f"{self.instance.root}/testparm", f"{self.instance.root}/etc/samba/smb.conf"

@@ -94,6 +94,9 @@ TEST_F(FolderMgrTest, UnusableFilesCannotBeLoaded) {
   for (const char* bad : {"", "[] x", "{}", "\"a\""}) {
     test::WriteFile(path_, bad);
     EXPECT_EQ(FailureOf([] { FolderMgr(); }), "504 Cannot load json: " + path_) << bad;
+    EXPECT_TRUE(
+        log_.Contains("(FolderMgr) Failed [IsFileExist(kFileIndexFoldersCfgPath) && "
+                      "!folders.fromFile(kFileIndexFoldersCfgPath)], reason: Cannot load json: /"));
   }
   test::WriteFile(path_, "[[]]");
   EXPECT_EQ(FailureOf([] { FolderMgr(); }).substr(0, 20), "120 Not an object, d");
@@ -114,11 +117,13 @@ TEST_F(FolderMgrTest, AFailedSaveLeavesTheOldFileOrTheNew) {
   const struct rlimit tight = {200, unlimited.rlim_max};
   ASSERT_EQ(setrlimit(RLIMIT_FSIZE, &tight), 0);
   EXPECT_EQ(FailureOf(save), "505 " + path_);
+  EXPECT_TRUE(log_.Contains("(Save) Failed [!folders.toFile(kFileIndexFoldersCfgPath)], reason: " + path_ + " [err: "));
   ASSERT_EQ(setrlimit(RLIMIT_FSIZE, &unlimited), 0);
   EXPECT_FALSE(fs::exists(path_ + ".new"));
   EXPECT_EQ(test::ReadFile(path_), before);
   chmod_fails = true;
   EXPECT_EQ(FailureOf(save), "502 " + path_);
+  EXPECT_TRUE(log_.Contains("Failed [-1 == chmod(kFileIndexFoldersCfgPath, 0644)], reason: " + path_ + " [err: "));
   chmod_fails = false;
   EXPECT_EQ(Paths(FolderMgr().GetFolders()), "/photo /music ");
 }
@@ -144,6 +149,7 @@ TEST_F(FolderMgrTest, ChangesNameTheKindsThatDiffer) {
   EXPECT_EQ(Paths(mgr.GetFolders()), "/photo/a/b/c /photo/a ") << "a replaced entry stands last";
   EXPECT_EQ(Deleted(mgr, "/photo/a/b/c"), "/photo/a/b/c v");
   EXPECT_EQ(FailureOf([&mgr] { Deleted(mgr, "/photo/a/"); }), "902 /photo/a/");
+  EXPECT_TRUE(log_.Contains("(Get) Failed [it == folders_.end()], reason: /photo/a/"));
   EXPECT_EQ(FailureOf([&mgr] { Upserted(mgr, "/gone/a", "d"); }), "800 gone");
   EXPECT_EQ(FailureOf([&mgr] { Upserted(mgr, "photo", "d"); }), "120 ");
   EXPECT_EQ(Deleted(mgr, "/photo/a"), "/photo/a davp");

@@ -68,6 +68,10 @@ TEST_F(StatusMgrTest, UnusableFilesCannotBeLoaded) {
   for (const char* bad : {"", "{", "{} x", "[]", "7", R"({"share":[]})", R"({"share":1})"}) {
     Write(bad);
     EXPECT_EQ(FailureOf([] { StatusMgr(); }), "504 Cannot load json: " + path_) << bad;
+    EXPECT_TRUE(
+        log_.Contains("(StatusMgr) Failed [IsFileExist(kFileIndexStatusCfgPath) && "
+                      "!data_.fromFile(kFileIndexStatusCfgPath)], reason: Cannot load json: " +
+                      path_));
   }
   for (const char* odd : {"null", R"({"resume_time":1.5})", R"({"resume_time":"5","share":{"photo":"x"}})"}) {
     Write(odd);
@@ -101,6 +105,7 @@ TEST_F(StatusMgrTest, WhatFailsWhen) {
   }
   fs::create_directories(path_ + ".new");  // no file can be written beside
   EXPECT_EQ(FailureOf(set), "505 Failed to save json: " + path_);
+  EXPECT_TRUE(log_.Contains("[!data_.toFile(kFileIndexStatusCfgPath)], reason: Failed to save json: " + path_));
   (void)fs::remove(path_ + ".new");
   EXPECT_EQ(StatusMgr().GetPauseInfo(), 1700003600) << "the old file stays";
 }
