@@ -9,21 +9,25 @@
 namespace ferrox::test {
 
 /// Collects what the host's platform logs while it lives, in place of the system's log. One at a time.
-struct HostLog {
+class HostLog {
+ public:
   HostLog() {
-    lines.clear();
-    kova::host::SetLogSink([](int, const char* line) { lines.emplace_back(line); });
+    Lines().clear();
+    kova::host::SetLogSink([](int, const char* line) { Lines().emplace_back(line); });
   }
   HostLog(const HostLog&) = delete;
   HostLog& operator=(const HostLog&) = delete;
   ~HostLog() { kova::host::SetLogSink(nullptr); }
 
+  static std::vector<std::string>& Lines() {
+    static std::vector<std::string> lines;
+    return lines;
+  }
   /// How many lines hold `text`.
   static long Count(const std::string& text) {
-    return std::count_if(lines.begin(), lines.end(), [&](const auto& line) { return line.find(text) != line.npos; });
+    return std::count_if(Lines().begin(), Lines().end(),
+                         [&](const std::string& line) { return line.find(text) != std::string::npos; });
   }
-
-  static inline std::vector<std::string> lines;
 };
 
 }  // namespace ferrox::test

@@ -12,7 +12,7 @@ using ferrox::test::FakeCallFails;
 using ferrox::test::FakePlatform;
 
 int KOVAGetFSType(const char* path, int follow_mount) {
-  if (FakeCallFails(__func__, path, follow_mount)) return -1;
+  if (FakeCallFails(__func__, std::string(path) + ", " + std::to_string(follow_mount))) return -1;
   int type = KOVA_FS_EXT;
   size_t best = 0;
   for (const auto& [prefix, code] : FakePlatform::Get().fs_types) {
@@ -50,8 +50,10 @@ int KOVAACLPermGet(const char* path) {
 }
 
 int KOVAFileCopy(const char* src, const char* dst, const KOVAFileCopyOptions* options, int flag) {
-  const std::string words = std::to_string(options->words[0]) + std::to_string(options->words[1]);
-  if (FakeCallFails(__func__, src, dst, words, flag)) return -1;
+  if (FakeCallFails(__func__, std::string(src) + ", " + dst + ", " + std::to_string(options->words[0]) +
+                                  std::to_string(options->words[1]) + ", " + std::to_string(flag))) {
+    return -1;
+  }
   namespace fs = std::filesystem;
   std::error_code error;
   if (options->words[0] != 1 && fs::exists(fs::symlink_status(dst, error))) return KOVA_FAIL(KOVA_ERR_SYSTEM);

@@ -9,11 +9,19 @@ using ferrox::test::FakePlatform;
 
 namespace KOVA::KOVANOTIFYD {
 
+namespace {
+
+std::string CallArguments(const std::string& queue_path, const std::string& application, int type) {
+  return queue_path + ", " + application + ", " + std::to_string(type);
+}
+
+}  // namespace
+
 bool MonitorQueue::Upsert(const MonitorQueue& queue, const std::string& application, int type) {
   const Json::Value& document = queue.Document();
   const bool named = document.isObject() && document["queue"].isString();
   const std::string queue_path = named ? document["queue"].asString() : "";
-  if (FakeCallFails("MonitorQueue::Upsert", queue_path, application, type)) return false;
+  if (FakeCallFails("MonitorQueue::Upsert", CallArguments(queue_path, application, type))) return false;
   if (!kova::MonitorDocumentProblem(document).empty()) {
     (void)KOVA_FAIL(KOVA_ERR_BAD_PARAMETER);
     return false;
@@ -23,7 +31,7 @@ bool MonitorQueue::Upsert(const MonitorQueue& queue, const std::string& applicat
 }
 
 bool MonitorQueue::Delete(const std::string& queue_path, const std::string& application, int type) {
-  if (FakeCallFails("MonitorQueue::Delete", queue_path, application, type)) return false;
+  if (FakeCallFails("MonitorQueue::Delete", CallArguments(queue_path, application, type))) return false;
   (void)FakePlatform::Get().monitor_queues.erase({application, type, queue_path});
   return true;
 }

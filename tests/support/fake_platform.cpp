@@ -15,12 +15,6 @@ namespace {
 std::atomic<bool> g_ready{false};
 std::mutex g_calls_mutex;
 
-uint32_t Effective(int (*get)(uint32_t*, uint32_t*, uint32_t*)) {
-  uint32_t real = 0, effective = 0, saved = 0;
-  (void)get(&real, &effective, &saved);
-  return effective;
-}
-
 }  // namespace
 
 FakePlatform& FakePlatform::Get() {
@@ -35,8 +29,12 @@ FakePlatform& FakePlatform::Get() {
 
 void FakePlatform::Reset() {
   *this = FakePlatform();
-  euid = Effective(&getresuid);
-  egid = Effective(&getresgid);
+  uid_t real = 0, effective = 0, saved = 0;
+  gid_t real_group = 0, effective_group = 0, saved_group = 0;
+  (void)getresuid(&real, &effective, &saved);
+  (void)getresgid(&real_group, &effective_group, &saved_group);
+  euid = effective;
+  egid = effective_group;
   users["root"] = {0, 0, true, "/root", 0};
   if (euid != 0) users["owner"] = {euid, egid, false, "/home/owner", 0};
 }
@@ -51,12 +49,14 @@ int FakePlatform::CallCount(const std::string& function) const {
   }));
 }
 
-bool FakePlatform::Fails(const std::string& function, const std::string& call) {
-  if (on_call) on_call(call);
+bool FakeCallFails(const char* function, const std::string& arguments) {
+  FakePlatform& platform = FakePlatform::Get();
+  const std::string call = std::string(function) + "(" + arguments + ")";
+  if (platform.on_call) platform.on_call(call);
   const std::lock_guard<std::mutex> guard(g_calls_mutex);
-  calls.push_back(call);
-  const auto found = failing.find(function);
-  if (found == failing.end()) return false;
+  platform.calls.push_back(call);
+  const auto found = platform.failing.find(function);
+  if (found == platform.failing.end()) return false;
   FakeFailure& failure = found->second;
   if (failure.skip > 0) {
     --failure.skip;
@@ -72,8 +72,15 @@ bool FakePlatform::Fails(const std::string& function, const std::string& call) {
 
 // The identity that the code under test sees, in place of the C library's. Sanitizers ask before main.
 extern "C" uid_t geteuid() noexcept {
-  return ferrox::test::g_ready ? ferrox::test::FakePlatform::Get().euid : ferrox::test::Effective(&getresuid);
+  uid_t real = 0, effective = 0, saved = 0;
+  if (ferrox::test::g_ready) return ferrox::test::FakePlatform::Get().euid;
+  (void)getresuid(&real, &effective, &saved);
+  return effective;
 }
+
 extern "C" gid_t getegid() noexcept {
-  return ferrox::test::g_ready ? ferrox::test::FakePlatform::Get().egid : ferrox::test::Effective(&getresgid);
+  gid_t real = 0, effective = 0, saved = 0;
+  if (ferrox::test::g_ready) return ferrox::test::FakePlatform::Get().egid;
+  (void)getresgid(&real, &effective, &saved);
+  return effective;
 }

@@ -8,7 +8,6 @@
 #include <map>
 #include <optional>
 #include <set>
-#include <sstream>
 #include <string>
 #include <tuple>
 #include <utility>
@@ -74,6 +73,8 @@ struct FakePlatform {
   /// By the name of the platform function, for example "KOVAShareGet".
   std::map<std::string, FakeFailure> failing;
 
+  /// KOVAQuotaIsEnough; `failing` it makes it answer 0 with a code.
+  int quota_enough = 1;
   /// Type codes by path prefix (whole components), the longest wins; KOVA_FS_EXT elsewhere.
   std::map<std::string, int> fs_types;
   std::set<std::string> mount_points;
@@ -123,17 +124,9 @@ struct FakePlatform {
   bool Called(const std::string& call) const;
   /// How many calls there were of the named function.
   int CallCount(const std::string& function) const;
-  bool Fails(const std::string& function, const std::string& call);
 };
 
 /// Records the call and tells whether it is scripted to fail; the failure's code is then set. For the fake's sources.
-template <typename... Arguments>
-bool FakeCallFails(const char* function, const Arguments&... arguments) {
-  std::ostringstream call;
-  [[maybe_unused]] const char* comma = "";
-  call << function << "(";
-  ((call << std::exchange(comma, ", ") << arguments), ...);
-  return FakePlatform::Get().Fails(function, call.str() + ")");
-}
+bool FakeCallFails(const char* function, const std::string& arguments);
 
 }  // namespace ferrox::test

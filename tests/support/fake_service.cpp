@@ -17,8 +17,11 @@ using ferrox::test::FakeProgram;
 namespace {
 
 int Switch(const char* name, bool on) {
-  (void)FakePlatform::Get().running_services.erase(name);
-  if (on) FakePlatform::Get().running_services.insert(name);
+  if (on) {
+    FakePlatform::Get().running_services.insert(name);
+  } else {
+    FakePlatform::Get().running_services.erase(name);
+  }
   return 0;
 }
 
@@ -32,23 +35,27 @@ int Execute(const char* function, FakeProgram program) {
 
 }  // namespace
 
-int KLIBServiceStart(const char* name, int now) { return FakeCallFails(__func__, name, now) ? -1 : Switch(name, true); }
-int KLIBServiceStop(const char* name, int now) { return FakeCallFails(__func__, name, now) ? -1 : Switch(name, false); }
+int KLIBServiceStart(const char* name, int now) {
+  return FakeCallFails(__func__, std::string(name) + ", " + std::to_string(now)) ? -1 : Switch(name, true);
+}
+int KLIBServiceStop(const char* name, int now) {
+  return FakeCallFails(__func__, std::string(name) + ", " + std::to_string(now)) ? -1 : Switch(name, false);
+}
 int KLIBServiceRestart(const char* name) { return FakeCallFails(__func__, name) ? -1 : Switch(name, true); }
 int KLIBServicectlStart(const char* name, int kind) {
-  return FakeCallFails(__func__, name, kind) ? -1 : Switch(name, true);
+  return FakeCallFails(__func__, std::string(name) + ", " + std::to_string(kind)) ? -1 : Switch(name, true);
 }
 int KLIBServicectlStop(const char* name, int kind) {
-  return FakeCallFails(__func__, name, kind) ? -1 : Switch(name, false);
+  return FakeCallFails(__func__, std::string(name) + ", " + std::to_string(kind)) ? -1 : Switch(name, false);
 }
 int KLIBServiceIsRunning(const char* name) {
   if (FakeCallFails(__func__, name)) return -1;
   return static_cast<int>(FakePlatform::Get().running_services.count(name));
 }
 
-int KOVASMBIsEnableSpotlight() { return FakeCallFails(__func__) ? 0 : FakePlatform::Get().spotlight; }
+int KOVASMBIsEnableSpotlight() { return FakeCallFails(__func__, "") ? 0 : FakePlatform::Get().spotlight; }
 int KOVASMBSetSpotlight(int enable) {
-  if (FakeCallFails(__func__, enable)) return -1;
+  if (FakeCallFails(__func__, std::to_string(enable))) return -1;
   FakePlatform::Get().spotlight = enable != 0 ? 1 : 0;
   return 0;
 }

@@ -61,7 +61,7 @@ int KOVAShareGet(const char* name, KOVAShare** share) {
 }
 
 int KLIBShareEnum(KLIBCSzList** list, const KOVAShareFilter* filter) {
-  if (FakeCallFails(__func__)) return -1;
+  if (FakeCallFails(__func__, "")) return -1;
   int count = 0;
   for (const auto& [name, share] : FakePlatform::Get().shares) {
     if (filter != nullptr && filter->skip_encrypted != 0 && share.encryption != 0) continue;
@@ -103,7 +103,7 @@ int KLIBShareHideUnreadableGet(const KOVAShare* share, int* value) {
 }
 
 int KOVAShareUserPrivGet(const char* user, const KOVAShare* share) {
-  if (FakeCallFails(__func__, user, share->name)) return -1;
+  if (FakeCallFails(__func__, std::string(user) + ", " + share->name)) return -1;
   const FakePlatform& platform = FakePlatform::Get();
   if (platform.users.count(user) == 0) return KOVA_FAIL(KOVA_ERR_NO_SUCH_USER);
   const auto found = platform.shares.find(share->name);
@@ -113,7 +113,8 @@ int KOVAShareUserPrivGet(const char* user, const KOVAShare* share) {
 }
 
 int KOVAQuotaIsEnough(uint32_t uid, const char* path, int64_t bytes) {
-  return FakeCallFails(__func__, uid, path, bytes) ? 0 : 1;
+  if (FakeCallFails(__func__, std::to_string(uid) + ", " + path + ", " + std::to_string(bytes))) return 0;
+  return FakePlatform::Get().quota_enough;
 }
 
 int FILEIDXGetIndexID(const char* share_name, char* buffer, size_t size) {
@@ -136,13 +137,13 @@ int KOVAShareIsShareRecycle(const char* full_path) {
   return AnyHolds(FakePlatform::Get().recycle_bins, full_path);
 }
 int KOVARecycleUserHomePathIsExist(const char* full_path, int auth_types) {
-  if (FakeCallFails(__func__, full_path, auth_types)) return -1;
+  if (FakeCallFails(__func__, std::string(full_path) + ", " + std::to_string(auth_types))) return -1;
   return AnyHolds(FakePlatform::Get().home_recycle_bins, full_path);
 }
 
 int KOVARecycleHomeEnumRecyclePath(KLIBCSzList** list) {
-  return FakeCallFails(__func__) ? -1 : PushHomeRecyclePaths(list, kEveryHome);
+  return FakeCallFails(__func__, "") ? -1 : PushHomeRecyclePaths(list, kEveryHome);
 }
 int KOVARecycleHomeEnumRecyclePathForAuthType(KLIBCSzList** list, AUTH_TYPE auth) {
-  return FakeCallFails(__func__, auth) ? -1 : PushHomeRecyclePaths(list, auth);
+  return FakeCallFails(__func__, std::to_string(auth)) ? -1 : PushHomeRecyclePaths(list, auth);
 }

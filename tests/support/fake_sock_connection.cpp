@@ -57,7 +57,7 @@ bool SockConnection::Send(const std::string& message) {
 }
 
 bool SockConnection::Recv(std::string& message) {
-  if (FakeCallFails("Recv")) return false;
+  if (FakeCallFails("Recv", "")) return false;
   if (fd_ != kScripted) return kova::RecvFrame(fd_, message, message_limit_bytes_);
   if (t_connection.fault == FakeConnection::kRecv) return Refuse();
   message = std::exchange(t_connection.reply, {});
