@@ -6,7 +6,6 @@
 #include <algorithm>
 #include <cerrno>
 #include <optional>
-#include <string_view>
 #include <unordered_map>
 
 #include <kova/error.h>
@@ -16,6 +15,7 @@
 #include "common/log.h"
 #include "common/new_class.h"
 #include "common/paths.h"
+#include "fileindex/folder_share.h"
 #include "fileindex/path_table.h"
 #include "fileindex/util.h"
 #include "sdk/credentials.h"
@@ -31,15 +31,6 @@ std::string FoldersPath() { return InstancePath(kFileIndexFoldersCfgPath); }
 
 bool ReadFolders(Json::Value& folders, const std::string& path) {
   return fromFile(folders, path) && IsJsonArray(folders);
-}
-
-/// Only a path that begins with "/" names a share.
-bool HasShare(const Folder& folder) { return StringStartWith(folder.GetPath(), "/"); }
-
-/// Folder::GetShare() == share, without a copy.
-bool IsOfShare(const Folder& folder, std::string_view share) {
-  const std::string_view path = folder.GetPath();
-  return HasShare(folder) && path.substr(1, path.find('/', 1) - 1) == share;
 }
 
 /// The flag that a listing is sorted by, null for another key.

@@ -24,6 +24,7 @@
 #include "common/sdk_mutex.h"
 #include "fileindex/elastic/elastic_control.h"
 #include "fileindex/folder_mgr.h"
+#include "fileindex/folder_share.h"
 #include "fileindex/index_mgr.h"
 #include "fileindex/status_mgr.h"
 #include "fileindex/util.h"
@@ -111,10 +112,6 @@ bool IsShareKnown(const std::string& share) {
     if (KLIBCErrGet() != KOVA_ERR_NO_SUCH_SHARE) throw;
     return false;
   }
-}
-
-bool IsOfShare(const Folder& folder, const std::string& share) {
-  return StringStartWith(folder.GetPath(), "/") && folder.GetShare() == share;
 }
 
 void SetupRelatedServices(bool enable) {

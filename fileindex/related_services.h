@@ -5,13 +5,10 @@
 /// What the management operations switch, register, remove and tell outside the configuration.
 namespace ferrox::fileindex {
 
-class Folder;
 class FolderMgr;
 
 /// Whether the platform knows the share. @throws Error kNoSuchShare when it cannot tell.
 bool IsShareKnown(const std::string& share);
-/// Whether the entry belongs to the share; one whose path does not begin with "/" belongs to none.
-bool IsOfShare(const Folder& folder, const std::string& share);
 
 /// Switches what indexing needs on or off: Spotlight in the file-sharing service, content extraction, the index daemon.
 /// Each is tried whatever became of the ones before; a failure is logged only.

@@ -9,6 +9,7 @@
 #include "common/new_class.h"
 #include "fileindex/elastic/elastic_control.h"
 #include "fileindex/folder_mgr.h"
+#include "fileindex/folder_share.h"
 #include "fileindex/index_mgr.h"
 #include "fileindex/operation_steps.h"
 #include "fileindex/optree.h"
