@@ -12,7 +12,7 @@ install(EXPORT fileindexTargets NAMESPACE fileindex:: DESTINATION ${package_fold
 # Of the library's own headers, those that describe what libfileindex.so shows; the others are its own business.
 install(DIRECTORY ${CMAKE_SOURCE_DIR}/common ${CMAKE_SOURCE_DIR}/sdk DESTINATION ${header_folder}
         FILES_MATCHING PATTERN "*.h")
-foreach(header folder folder_mgr index_mgr optree queue_mgr status_mgr util elastic/comm elastic/elastic_control elastic/fields)
+foreach(header folder folder_mgr index_mgr optree queue_mgr status_mgr util watch_list elastic/comm elastic/elastic_control elastic/fields)
   get_filename_component(folder fileindex/${header} DIRECTORY)
   install(FILES ${CMAKE_SOURCE_DIR}/fileindex/${header}.h DESTINATION ${header_folder}/${folder})
 endforeach()

@@ -24,10 +24,10 @@
 #include "common/sdk_mutex.h"
 #include "fileindex/elastic/elastic_control.h"
 #include "fileindex/folder_mgr.h"
-#include "fileindex/folder_share.h"
 #include "fileindex/index_mgr.h"
 #include "fileindex/status_mgr.h"
 #include "fileindex/util.h"
+#include "fileindex/watch_list.h"
 #include "sdk/share.h"
 
 namespace ferrox::fileindex {
@@ -37,12 +37,9 @@ namespace {
 using KOVA::KOVANOTIFYD::MONITOR_QUEUE_TYPE_APPLICATION;
 using KOVA::KOVANOTIFYD::MonitorQueue;
 
-constexpr char kAppName[] = "fileindex";
 constexpr char kContentExtractd[] = "kovacontentextractd";
 constexpr char kFileIndexd[] = "pkg-Ferrox-fileindexd";
 constexpr char kFileSharing[] = "samba";
-constexpr int kWatchedChanges = 0xFFC6;
-constexpr char kNeverWatched[] = "@eaDir";
 constexpr size_t kPathBytes = 4096;
 
 std::string PlatformError() {
@@ -69,14 +66,6 @@ void SetupSpotlight(bool enable) {
   if ((KOVASMBIsEnableSpotlight() != 0) == enable) return;
   if (!CallSucceeds(KOVASMBSetSpotlight(enable ? 1 : 0), "KOVASMBSetSpotlight")) return;
   (void)CallSucceeds(KLIBServiceRestart(kFileSharing), "KLIBServiceRestart");
-}
-
-Json::Value WatchOf(const Folder& folder) {
-  Json::Value watch(Json::objectValue);
-  watch["path"] = folder.GetFullPath();
-  watch["mask"] = kWatchedChanges;
-  watch["ignore"].append(kNeverWatched);
-  return watch;
 }
 
 /// Whether the path names something that "rm -rf" may be given: an absolute path that ends in a name.
@@ -133,13 +122,7 @@ void PrepareServices() { SetupRelatedServices(!FolderMgr().GetFolders().empty())
 
 void UpsertKOVANotifydCfg(const std::string& share_name, const FolderMgr& folder_mgr) {
   const sdk::SDKShare share(share_name);
-  Json::Value document(Json::objectValue);
-  document["queue"] = share.GetQueuePath();
-  Json::Value& config = document["config"] = Json::Value(Json::arrayValue);
-  for (const std::shared_ptr<Folder>& folder : folder_mgr.GetFolders()) {
-    if (IsOfShare(*folder, share_name)) config.append(WatchOf(*folder));
-  }
-  const MonitorQueue monitor_queue(document);
+  const MonitorQueue monitor_queue(WatchListOf(share_name, share.GetQueuePath(), folder_mgr));
   FERROX_FAIL_IF(!MonitorQueue::Upsert(monitor_queue, kAppName, MONITOR_QUEUE_TYPE_APPLICATION), Error::kInternal,
                  "MonitorQueue::Upsert failed, share=" + share_name);
 }

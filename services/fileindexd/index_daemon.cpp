@@ -106,8 +106,9 @@ void IndexDaemon::Follow() {
 void IndexDaemon::Reconcile() {
   try {
     workers_.Reconcile();
+    watched_.Reconcile();
   } catch (const Error& error) {
-    Log(LOG_ERR, "the workers stay as they are: %s (%d)", error.what(), error.Code());
+    Log(LOG_ERR, "the workers and watches stay as they are: %s (%d)", error.what(), error.Code());
   }
 }
 

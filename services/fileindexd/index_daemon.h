@@ -11,6 +11,7 @@
 #include "services/fileindexd/interruption.h"
 #include "services/fileindexd/share_worker.h"
 #include "services/fileindexd/task_pool.h"
+#include "services/fileindexd/watch_registrations.h"
 #include "services/fileindexd/worker_set.h"
 #include "services/support/frame_server.h"
 
@@ -59,6 +60,7 @@ class IndexDaemon {
   TaskPool pool_;
   PauseState pause_;
   WorkerSet workers_;
+  WatchRegistrations watched_;
   FileWatch configuration_;
   std::atomic<bool> stopping_{false};
   std::thread follower_;

@@ -10,7 +10,8 @@ import sys
 LEVELS = {"platform": 0, "common": 1, "sdk": 2, "fileindex": 3, "services": 4, "cli": 4}
 # Inside fileindex/ the headers have an order of their own.
 HEADER_LEVELS = {"optree": 0, "util": 0, "queue_mgr": 1, "status_mgr": 1, "elastic/comm": 2, "elastic/elastic_control": 2,
-                 "folder": 3, "folder_mgr": 3, "operation_steps": 4, "related_services": 4, "index_mgr": 4}
+                 "folder": 3, "folder_mgr": 3, "operation_steps": 4, "watch_list": 4, "related_services": 4,
+                 "index_mgr": 4}
 # Two sources reach right: a custom event needs the queue and, when it cannot be written, the share's status; a queue
 # that is being read keeps the folders' configuration alive. The tool keeps the host's own table of shares, the index
 # daemon watches it, and the tool tells why a service of the host did not start.
