@@ -14,6 +14,7 @@
 #include "common/log.h"
 #include "common/paths.h"
 #include "fileindex/status_mgr.h"
+#include "services/support/json_command.h"
 
 namespace ferrox::indexd {
 
@@ -43,14 +44,6 @@ std::string ShareName(const Json::Value& data) {
   std::string share;
   GetJsonValue(share, data, "share_name", true);
   return share;
-}
-
-Json::Value ErrorReply(int code, const std::string& message) {
-  Json::Value reply;
-  reply["success"] = false;
-  reply["error"]["code"] = code;
-  reply["error"]["msg"] = message;
-  return reply;
 }
 
 }  // namespace
@@ -113,32 +106,12 @@ void IndexDaemon::Reconcile() {
 }
 
 std::string IndexDaemon::Handle(const std::string& request, const services::Peer& peer) {
-  try {
-    Json::Value reply;
-    reply["data"] = Dispatch(request, peer);
-    reply["success"] = true;
-    return toString(reply);
-  } catch (const Error& error) {
-    return toString(ErrorReply(error.Code(), error.what()));
-  } catch (const std::exception& error) {
-    return toString(ErrorReply(Error::kInternal, error.what()));
-  }
-}
-
-/// A request is a JSON text with or without the terminating zero that the library sends.
-Json::Value IndexDaemon::Dispatch(const std::string& request, const services::Peer& peer) {
-  FERROX_FAIL_IF(peer.uid != 0 && peer.uid != geteuid(), Error::kEngineNotPermitted,
-                 "only root and the owner of this instance may steer it");
-  const size_t end = request.find_last_not_of('\0');
-  Json::Value json;
-  const bool parsed = fromString(json, request.substr(0, end == std::string::npos ? 0 : end + 1)) && json.isObject();
-  FERROX_FAIL_IF(!parsed, Error::kBadArgument, "the request is not a JSON object");
-  std::string type;
-  GetJsonValue(type, json, "type", true);
-  for (const Command& command : kCommands) {
-    if (type == command.type) return (this->*command.run)(json["data"]);
-  }
-  throw Error(Error::kBadArgument, "unknown command: " + type);
+  return services::AnswerJsonCommand(request, peer, [this](const std::string& type, const Json::Value& data) {
+    for (const Command& command : kCommands) {
+      if (type == command.type) return (this->*command.run)(data);
+    }
+    throw Error(Error::kBadArgument, "unknown command: " + type);
+  });
 }
 
 Json::Value IndexDaemon::OnPause(const Json::Value& data) {

@@ -51,7 +51,6 @@ class IndexDaemon {
   Json::Value OnSettingChanged(const Json::Value& data);
   Json::Value OnStatus(const Json::Value& data);
 
-  Json::Value Dispatch(const std::string& request, const services::Peer& peer);
   void SetPause(int64_t resume_time);
   void Follow();
   void Reconcile();

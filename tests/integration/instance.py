@@ -75,7 +75,7 @@ class Instance:
             return int(file.read())
 
     def note_pids(self):
-        for program in ("kovaelasticd", "fileindexd"):
+        for program in ("kovaelasticd", "kovanotifyd", "fileindexd"):
             try:
                 self.pids.add(self.pid(program))
             except (OSError, ValueError):

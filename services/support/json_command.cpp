@@ -1,0 +1,49 @@
+#include "services/support/json_command.h"
+
+#include <unistd.h>
+
+#include "common/error.h"
+#include "common/json_util.h"
+#include "common/log.h"
+
+namespace ferrox::services {
+
+namespace {
+
+Json::Value ErrorReply(int code, const std::string& message) {
+  Json::Value reply;
+  reply["success"] = false;
+  reply["error"]["code"] = code;
+  reply["error"]["msg"] = message;
+  return reply;
+}
+
+/// A request is a JSON text with or without the terminating zero that the library sends.
+Json::Value Dispatch(const std::string& request, const Peer& peer, const JsonCommand& command) {
+  FERROX_FAIL_IF(peer.uid != 0 && peer.uid != geteuid(), Error::kEngineNotPermitted,
+                 "only root and the owner of this instance may steer it");
+  const size_t end = request.find_last_not_of('\0');
+  Json::Value json;
+  const bool parsed = fromString(json, request.substr(0, end == std::string::npos ? 0 : end + 1)) && json.isObject();
+  FERROX_FAIL_IF(!parsed, Error::kBadArgument, "the request is not a JSON object");
+  std::string type;
+  GetJsonValue(type, json, "type", true);
+  return command(type, json["data"]);
+}
+
+}  // namespace
+
+std::string AnswerJsonCommand(const std::string& request, const Peer& peer, const JsonCommand& command) {
+  try {
+    Json::Value reply;
+    reply["data"] = Dispatch(request, peer, command);
+    reply["success"] = true;
+    return toString(reply);
+  } catch (const Error& error) {
+    return toString(ErrorReply(error.Code(), error.what()));
+  } catch (const std::exception& error) {
+    return toString(ErrorReply(Error::kInternal, error.what()));
+  }
+}
+
+}  // namespace ferrox::services
