@@ -13,6 +13,7 @@
 #include "common/json_util.h"
 #include "common/log.h"
 #include "common/paths.h"
+#include "common/scope_exit.h"
 #include "fileindex/status_mgr.h"
 #include "services/support/json_command.h"
 
@@ -23,6 +24,10 @@ namespace {
 /// The configuration is looked at again after so long, whether or not it was seen to change.
 constexpr std::chrono::seconds kSlowTimer(30);
 constexpr std::chrono::seconds kSlowTimerWithoutWatch(2);
+
+constexpr int kSyncTimeoutMs = 30 * 1000;
+constexpr int kSyncTimeoutMaxMs = 600 * 1000;
+constexpr char kStopping[] = "the index daemon is being stopped; start it with 'fileindexctl up'";
 
 std::vector<std::string> FilesOf(const IndexDaemon::Options& options) {
   std::vector<std::string> files = options.share_files;
@@ -46,6 +51,19 @@ std::string ShareName(const Json::Value& data) {
   return share;
 }
 
+/// Absent or null: none.
+std::vector<std::string> ShareNames(const Json::Value& data) {
+  std::vector<std::string> names;
+  const Json::Value& shares = data.isObject() ? data["shares"] : Json::Value::nullSingleton();
+  bool usable = IsJsonArray(shares);
+  for (Json::ArrayIndex i = 0; usable && i < shares.size(); ++i) {
+    usable = shares[i].isString();
+    if (usable) names.push_back(shares[i].asString());
+  }
+  if (!usable) throw Error(Error::kBadArgument, "shares is not an array of names");
+  return names;
+}
+
 }  // namespace
 
 struct IndexDaemon::Command {
@@ -59,6 +77,7 @@ constexpr IndexDaemon::Command IndexDaemon::kCommands[] = {
     {"worker_create", &IndexDaemon::OnWorkerCreate},
     {"worker_delete", &IndexDaemon::OnWorkerDelete},
     {"notify_setting_changed", &IndexDaemon::OnSettingChanged},
+    {"sync", &IndexDaemon::OnSync},
     {"status", &IndexDaemon::OnStatus},
 };
 
@@ -144,6 +163,25 @@ Json::Value IndexDaemon::OnWorkerDelete(const Json::Value& data) {
 Json::Value IndexDaemon::OnSettingChanged(const Json::Value& data) {
   workers_.SettingChanged(ShareName(data));
   return Json::Value();
+}
+
+Json::Value IndexDaemon::OnSync(const Json::Value& data) {
+  int timeout_ms = kSyncTimeoutMs;
+  GetJsonValue(timeout_ms, data, "timeout_ms", false);
+  if (timeout_ms < 0 || timeout_ms > kSyncTimeoutMaxMs) {
+    throw Error(Error::kBadArgument, "timeout_ms is not from 0 to " + std::to_string(kSyncTimeoutMaxMs));
+  }
+  const auto end = std::chrono::steady_clock::now() + std::chrono::milliseconds(timeout_ms);
+  const ScopeExit count([this] { --syncs_; });
+  if (++syncs_ > kSyncsMax) throw Error(Error::kInternal, "too many wait for their changes already; ask again");
+  const std::string problems = syncs_ended_ ? kStopping : workers_.Sync(ShareNames(data), end);
+  if (!problems.empty()) throw Error(Error::kInternal, problems);
+  return Json::Value();
+}
+
+void IndexDaemon::EndSyncs() {
+  syncs_ended_ = true;
+  workers_.EndSyncs(kStopping);
 }
 
 Json::Value IndexDaemon::OnStatus(const Json::Value&) {

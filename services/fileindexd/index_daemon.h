@@ -21,6 +21,10 @@ namespace ferrox::indexd {
 /// (docs/formats/daemon.md).
 class IndexDaemon {
  public:
+  /// Requests that wait for shares hold a thread each; so many at once, so that others are left for the rest.
+  static constexpr unsigned kSyncsMax = 24;
+  static constexpr unsigned kRequestThreads = kSyncsMax + 4;
+
   struct Options {
     /// Threads that read files, for all shares together; 0: one a processor.
     unsigned workers = 0;
@@ -39,6 +43,8 @@ class IndexDaemon {
 
   /// Answers one request; never throws. Safe from several threads.
   std::string Handle(const std::string& request, const services::Peer& peer);
+  /// Ends the requests that wait for shares, and those to come. From any thread.
+  void EndSyncs();
 
  private:
   struct Command;
@@ -49,6 +55,7 @@ class IndexDaemon {
   Json::Value OnWorkerCreate(const Json::Value& data);
   Json::Value OnWorkerDelete(const Json::Value& data);
   Json::Value OnSettingChanged(const Json::Value& data);
+  Json::Value OnSync(const Json::Value& data);
   Json::Value OnStatus(const Json::Value& data);
 
   void SetPause(int64_t resume_time);
@@ -61,6 +68,8 @@ class IndexDaemon {
   WorkerSet workers_;
   WatchRegistrations watched_;
   FileWatch configuration_;
+  std::atomic<unsigned> syncs_{0};
+  std::atomic<bool> syncs_ended_{false};
   std::atomic<bool> stopping_{false};
   std::thread follower_;
 };

@@ -50,6 +50,8 @@ int main(int argc, char** argv) try {
   ferrox::indexd::IndexDaemon index_daemon(options);
   ferrox::services::FrameServerOptions server_options;
   server_options.socket_path = ferrox::InstancePath(ferrox::kFileIndexdSocket);
+  server_options.workers = ferrox::indexd::IndexDaemon::kRequestThreads;
+  server_options.on_stop = [&index_daemon] { index_daemon.EndSyncs(); };
   ferrox::services::FrameServer server(server_options,
                                        [&index_daemon](const std::string& request, const ferrox::services::Peer& peer) {
                                          return index_daemon.Handle(request, peer);

@@ -104,6 +104,7 @@ void ShareWorker::Start() {
 
 void ShareWorker::Stop() {
   stopping_ = true;
+  progress_.End("its indexing was just ended or begun anew; ask again");
   Wake();
   if (thread_.joinable()) thread_.join();
 }
@@ -118,11 +119,43 @@ void ShareWorker::Wake() {
   watch_.Wake();
 }
 
+uint64_t ShareWorker::RequestSync() {
+  if (NothingWaits()) return 0;
+  const uint64_t request = progress_.Ask();
+  Wake();
+  return request;
+}
+
+std::string ShareWorker::AwaitSync(uint64_t request, QueueProgress::TimePoint end) {
+  std::string reason;
+  switch (progress_.Wait(request, end, reason)) {
+    case QueueProgress::Result::kDone:
+      return "";
+    case QueueProgress::Result::kFailed:
+      return "share " + share_ + ": " + reason;
+    case QueueProgress::Result::kTimeout:
+      break;
+  }
+  return "share " + share_ +
+         ": its changes are still being indexed; give more time, 'fileindexctl status' shows how far it is";
+}
+
+/// In this order: what leaves the live queue is in the detached one until the index has it.
+bool ShareWorker::NothingWaits() const {
+  if (!settled_ || HasContent(queue_path_) || IsFileExist(queue_path_ + ".tmp")) return false;
+  try {
+    return (StatusMgr().GetShareStatus(share_) & StatusMgr::kNeedReindex) == 0;
+  } catch (const Error&) {
+    return false;  // the worker tells why
+  }
+}
+
 void ShareWorker::Loop() {
   const InterruptionScope scope(interruption_);
   while (!stopping_) {
     if (environment_.pause.Paused()) {
       status_.SetState(ShareStatus::State::kPaused);
+      progress_.Failed(progress_.Asked(), "indexing is paused; 'fileindexctl resume' resumes it");
       watch_.WaitForWake(environment_.pause.Left());
       continue;
     }
@@ -139,6 +172,8 @@ void ShareWorker::Loop() {
 }
 
 milliseconds ShareWorker::Round() {
+  settled_ = false;
+  serves_ = progress_.Asked();
   try {
     RunOnce();
     delay_ = milliseconds(0);
@@ -148,6 +183,8 @@ milliseconds ShareWorker::Round() {
       status_.SetState(ShareStatus::State::kStarting, "the index is from before a change that is yet to be told");
       return kEventPoll;
     }
+    settled_ = true;
+    progress_.Done(serves_);
     status_.SetState(ShareStatus::State::kIdle);
     return watch_.SeesChanges() ? kSlowTimer : kSlowTimerWithoutWatch;
   } catch (const Interrupted&) {
@@ -159,7 +196,7 @@ milliseconds ShareWorker::Round() {
   } catch (const std::exception& error) {
     status_.EndPass();
     Log(LOG_ERR, "share %s: unexpected failure: %s", share_.c_str(), error.what());
-    status_.SetState(ShareStatus::State::kError, error.what());
+    Tell(ShareStatus::State::kError, error.what());
     return NextDelay(seconds(10), seconds(300));
   }
 }
@@ -176,8 +213,7 @@ milliseconds ShareWorker::OnFailure(const Error& error) {
     // The share is gone: said below, as the failure that it led to.
   }
   if (error.Code() == Error::kEngineUnreachable) {
-    status_.SetState(ShareStatus::State::kWaitingForEngine,
-                     "the search engine does not answer; start it with 'fileindexctl up'");
+    Tell(ShareStatus::State::kWaitingForEngine, "the search engine does not answer; start it with 'fileindexctl up'");
     return NextDelay(seconds(1), seconds(30));
   }
   if (error.Code() == Error::kEngineIndexPaused) return OnIndexPaused();
@@ -185,14 +221,20 @@ milliseconds ShareWorker::OnFailure(const Error& error) {
     status_.SetState(ShareStatus::State::kWaitingForEngine, error.what());
     return NextDelay(milliseconds(500), seconds(2));
   }
-  status_.SetState(ShareStatus::State::kError, std::string(error.what()) + " (" + std::to_string(error.Code()) + ")");
+  Tell(ShareStatus::State::kError, std::string(error.what()) + " (" + std::to_string(error.Code()) + ")");
   return NextDelay(seconds(2), seconds(300));
+}
+
+/// For people, and for those who wait for the share's changes.
+void ShareWorker::Tell(ShareStatus::State state, const std::string& detail) {
+  status_.SetState(state, detail);
+  progress_.Failed(serves_, detail);
 }
 
 /// The share is marked as needing a reindex, so that whatever the full disk swallowed is found again.
 milliseconds ShareWorker::OnNoSpace(const Error& error) {
-  status_.SetState(ShareStatus::State::kWaitingForSpace,
-                   "less than 100 MiB are free; indexing goes on by itself when there is more");
+  Tell(ShareStatus::State::kWaitingForSpace,
+       "less than 100 MiB are free; indexing goes on by itself when there is more");
   if (!told_no_space_) {
     told_no_space_ = true;
     Log(LOG_ERR, "share %s: no space for its index: %s", share_.c_str(), error.what());
@@ -208,7 +250,7 @@ milliseconds ShareWorker::OnNoSpace(const Error& error) {
 
 /// Where no folder of the share is paused, those that were have been removed, or a pause was not finished.
 milliseconds ShareWorker::OnIndexPaused() {
-  status_.SetState(ShareStatus::State::kPaused, "the share's index is paused; 'fileindexctl share resume' resumes it");
+  Tell(ShareStatus::State::kPaused, "the share's index is paused; 'fileindexctl share resume' resumes it");
   try {
     if (HasFailedTooLong(Error::kEngineIndexPaused) && !LoadFolders().AnyPaused()) index_->Resume();
   } catch (const Error&) {
@@ -233,12 +275,21 @@ void ShareWorker::RunOnce() {
   EnsureIndex();
   const std::string detached = queue_path_ + ".tmp";
   do {
+    serves_ = progress_.Asked();
     QueueNeededReindex();
     const bool begun_before = IsFileExist(detached);
     if (!begun_before && !HasContent(queue_path_)) break;
-    if (!begun_before) interruption_.SleepFor(environment_.gather_time);
+    if (!begun_before) Gather();
     RunPass();
+    if (!begun_before) progress_.Done(serves_);
   } while (true);
+}
+
+/// A queue that has just changed is left for a while, unless somebody waits for it.
+void ShareWorker::Gather() {
+  if (!progress_.IsAwaited()) watch_.WaitForWake(environment_.gather_time);
+  interruption_.Check();
+  serves_ = progress_.Asked();
 }
 
 void ShareWorker::CheckShare() {

@@ -15,6 +15,7 @@
 #include "services/fileindexd/applied_folders.h"
 #include "services/fileindexd/file_watch.h"
 #include "services/fileindexd/interruption.h"
+#include "services/fileindexd/queue_progress.h"
 #include "services/fileindexd/share_folders.h"
 #include "services/fileindexd/share_index.h"
 #include "services/fileindexd/share_status.h"
@@ -72,6 +73,14 @@ class ShareWorker {
   /// Looks again at the pause, the queue and the share's settings at once.
   void Wake();
 
+  /// Asks that all that is queued now be in the index soon. @return what AwaitSync waits for; 0 when nothing is to be
+  /// done. Like AwaitSync, from any thread.
+  uint64_t RequestSync();
+  /// Waits until it is, at most until `end`. @return "", or a sentence that names share, reason and remedy.
+  std::string AwaitSync(uint64_t request, QueueProgress::TimePoint end);
+  /// Ends all waiting in AwaitSync, because the daemon stops.
+  void EndSyncs(const std::string& reason) { progress_.End(reason); }
+
   /// The share's folder when the worker was made; once it is another, this worker is of no use any more.
   const std::string& Root() const { return root_; }
 
@@ -82,6 +91,9 @@ class ShareWorker {
 
  private:
   void Loop();
+  bool NothingWaits() const;
+  void Gather();
+  void Tell(ShareStatus::State state, const std::string& detail);
   /// One round of the loop: works, and tells how long to wait for the next.
   std::chrono::milliseconds Round();
   std::chrono::milliseconds OnFailure(const Error& error);
@@ -120,6 +132,9 @@ class ShareWorker {
   ShareStatus status_;
   FileWatch watch_;
   Interruption interruption_;
+  QueueProgress progress_;
+  uint64_t serves_ = 0;               ///< the requests that the present round serves
+  std::atomic<bool> settled_{false};  ///< the index was in line with folders and queue when the last round ended
   std::atomic<bool> stopping_{false};
   std::thread thread_;
 };

@@ -2,8 +2,8 @@
 
 #include <syslog.h>
 
+#include <algorithm>
 #include <set>
-#include <vector>
 
 #include "common/error.h"
 #include "common/log.h"
@@ -43,13 +43,42 @@ void WorkerSet::WakeAll() {
   for (const auto& [share, worker] : workers_) worker->Wake();
 }
 
+WorkerSet::Workers WorkerSet::Present() const {
+  const std::lock_guard lock(mutex_);
+  return workers_;
+}
+
+/// All are asked before the first is waited for.
+std::string WorkerSet::Sync(const std::vector<std::string>& shares, QueueProgress::TimePoint end) const {
+  Workers workers = Present();
+  std::string problems;
+  for (const std::string& share : shares) {
+    if (workers.count(share) != 0) continue;
+    problems += (problems.empty() ? "share " : "; share ") + share +
+                ": it is paused, or no folder of it is indexed; 'fileindexctl status' shows its state";
+  }
+  if (!shares.empty()) {
+    std::erase_if(workers, [&shares](const auto& item) {
+      return std::find(shares.begin(), shares.end(), item.first) == shares.end();
+    });
+  }
+  std::map<std::string, uint64_t> requests;
+  for (const auto& [share, worker] : workers) requests[share] = worker->RequestSync();
+  for (const auto& [share, request] : requests) {
+    const std::string problem = workers[share]->AwaitSync(request, end);
+    if (!problem.empty()) problems += (problems.empty() ? "" : "; ") + problem;
+  }
+  return problems;
+}
+
+void WorkerSet::EndSyncs(const std::string& reason) const {
+  for (const auto& [share, worker] : Present()) worker->EndSyncs(reason);
+}
+
 /// The engine, which is asked for each worker, may be slow; commands do not wait for it.
 Json::Value WorkerSet::Status() const {
-  std::unique_lock lock(mutex_);
-  const auto workers = workers_;
-  lock.unlock();
   Json::Value shares(Json::arrayValue);
-  for (const auto& [share, worker] : workers) shares.append(worker->Status());
+  for (const auto& [share, worker] : Present()) shares.append(worker->Status());
   return shares;
 }
 

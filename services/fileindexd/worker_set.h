@@ -6,6 +6,7 @@
 #include <mutex>
 #include <string>
 #include <utility>
+#include <vector>
 
 #include <json/value.h>
 
@@ -39,6 +40,11 @@ class WorkerSet {
   void SettingChanged(const std::string& share);
 
   void WakeAll();
+  /// Waits until all that is queued now for the shares (none named: for all that have a worker) is in the index, at
+  /// most until `end`. @return "", or a sentence for each share for which that cannot be said.
+  std::string Sync(const std::vector<std::string>& shares, QueueProgress::TimePoint end) const;
+  /// Ends all waiting in Sync, because the daemon stops.
+  void EndSyncs(const std::string& reason) const;
   /// One object a worker, in the order of the shares' names.
   Json::Value Status() const;
 
@@ -48,8 +54,11 @@ class WorkerSet {
     std::string root;
     bool all_paused = true;
   };
+  using Workers = std::map<std::string, std::shared_ptr<ShareWorker>>;
   static std::map<std::string, IndexedShare> IndexedShares();
 
+  /// The present ones, for what takes longer than others can wait for.
+  Workers Present() const;
   void ReconcileLocked();
   void End(const std::string& share);
   bool Wants(const std::string& share, const IndexedShare& indexed);
@@ -57,7 +66,7 @@ class WorkerSet {
   MakeWorker make_;
   mutable std::mutex mutex_;  ///< held while workers are made and stopped, so that commands keep their order
   std::map<std::string, Command> commanded_;
-  std::map<std::string, std::shared_ptr<ShareWorker>> workers_;  ///< shared with those who ask for its status
+  Workers workers_;  ///< shared with those who ask for its status
 };
 
 }  // namespace ferrox::indexd

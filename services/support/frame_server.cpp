@@ -242,6 +242,7 @@ class FrameServer::Impl {
       SendReplies(workers);
       EndIdle();
     }
+    options_.on_stop();
     workers.Finish();
     SendReplies(workers);
   }

@@ -30,6 +30,8 @@ struct FrameServerOptions {
   unsigned workers = 4;
   /// A connection that neither sends nor takes a byte for so long is ended.
   std::chrono::seconds idle_timeout{60};
+  /// Called when Run begins to end: what is to hurry the requests that it still waits for.
+  std::function<void()> on_stop = [] {};
 };
 
 /// Serves requests and replies on a Unix-domain socket, each a 4-byte length in host byte order and that many bytes. A
