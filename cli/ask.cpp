@@ -1,5 +1,7 @@
 #include "cli/ask.h"
 
+#include <algorithm>
+
 #include "cli/command.h"
 #include "common/error.h"
 #include "common/json_util.h"
@@ -22,6 +24,7 @@ struct Daemon {
 };
 constexpr Daemon kEngine = {"the search engine", kElasticdSocket, Error::kEngineUnreachable};
 constexpr Daemon kIndexDaemon = {"the index daemon", kFileIndexdSocket, Error::kInternal};
+constexpr Daemon kNotificationDaemon = {"the notification daemon", kNotifydSocket, Error::kInternal};
 
 Json::Value DataOf(const Daemon& daemon, const std::string& text) {
   Json::Value reply;
@@ -37,8 +40,9 @@ Json::Value DataOf(const Daemon& daemon, const std::string& text) {
   throw Failure(std::string(daemon.name) + ": " + message);
 }
 
-RequestResult Ask(const Daemon& daemon, const Json::Value& request, const std::string& end, std::string& reply) {
-  return services::AskLocally(InstancePath(daemon.socket), toString(request) + end, kLongestWait, reply);
+RequestResult Ask(const Daemon& daemon, const Json::Value& request, const std::string& end, std::string& reply,
+                  std::chrono::seconds longest = kLongestWait) {
+  return services::AskLocally(InstancePath(daemon.socket), toString(request) + end, longest, reply);
 }
 
 Json::Value Answer(const Daemon& daemon, RequestResult result, const std::string& reply) {
@@ -54,14 +58,30 @@ Json::Value Answer(const Daemon& daemon, RequestResult result, const std::string
   return DataOf(daemon, reply);
 }
 
-Json::Value IndexDaemonRequest(const std::string& type, const Json::Value& data) {
+/// Of the daemons that take the library's commands.
+RequestResult SendCommand(const Daemon& daemon, const std::string& type, const Json::Value& data, std::string& reply,
+                          std::chrono::seconds longest = kLongestWait) {
   Json::Value request;
   request["type"] = type;
   request["data"] = data;
-  return request;
+  return Ask(daemon, request, std::string(1, '\0'), reply, longest);
 }
 
-const std::string kTerminatingZero(1, '\0');
+Json::Value CommandIfRunning(const Daemon& daemon, const std::string& type, const Json::Value& data) {
+  std::string reply;
+  const RequestResult result = SendCommand(daemon, type, data, reply);
+  return result == RequestResult::kNotRunning ? Json::Value() : Answer(daemon, result, reply);
+}
+
+/// @throws Failure also when the daemon's answer comes much too late.
+Json::Value Sync(const Daemon& daemon, Json::Value data, std::chrono::milliseconds longest) {
+  constexpr std::chrono::seconds kSlack(5);
+  data["timeout_ms"] = Json::Int64(longest.count());
+  std::string reply;
+  const RequestResult result =
+      SendCommand(daemon, "sync", data, reply, std::chrono::duration_cast<std::chrono::seconds>(longest) + kSlack);
+  return Answer(daemon, result, reply);
+}
 
 }  // namespace
 
@@ -76,14 +96,31 @@ Json::Value AskEngine(const std::string& command, const Json::Value& data) {
 
 Json::Value AskIndexDaemon(const std::string& type, const Json::Value& data) {
   std::string reply;
-  const RequestResult result = Ask(kIndexDaemon, IndexDaemonRequest(type, data), kTerminatingZero, reply);
+  const RequestResult result = SendCommand(kIndexDaemon, type, data, reply);
   return Answer(kIndexDaemon, result, reply);
 }
 
 Json::Value AskIndexDaemonIfRunning(const std::string& type, const Json::Value& data) {
-  std::string reply;
-  const RequestResult result = Ask(kIndexDaemon, IndexDaemonRequest(type, data), kTerminatingZero, reply);
-  return result == RequestResult::kNotRunning ? Json::Value() : Answer(kIndexDaemon, result, reply);
+  return CommandIfRunning(kIndexDaemon, type, data);
+}
+
+Json::Value AskNotificationDaemonIfRunning(const std::string& type, const Json::Value& data) {
+  return CommandIfRunning(kNotificationDaemon, type, data);
+}
+
+/// First what the file systems have reported is in the queues, then what is in the queues is in the index.
+void AwaitChanges(const std::string& share, std::chrono::seconds longest) {
+  using std::chrono::milliseconds;
+  const auto end = std::chrono::steady_clock::now() + longest;
+  const Json::Value noticed = Sync(kNotificationDaemon, Json::Value(Json::objectValue), longest);
+  std::string problems;
+  for (const Json::Value& problem : noticed["problems"])
+    problems += (problems.empty() ? "" : "; ") + problem.asString();
+  if (!problems.empty()) throw Failure(problems);
+  Json::Value data(Json::objectValue);
+  if (!share.empty()) data["shares"].append(share);
+  const auto left = std::chrono::duration_cast<milliseconds>(end - std::chrono::steady_clock::now());
+  (void)Sync(kIndexDaemon, data, std::max(left, milliseconds(0)));
 }
 
 void RequireEngine() { (void)AskEngine("ping", Json::Value(Json::objectValue)); }

@@ -1,5 +1,6 @@
 #pragma once
 
+#include <chrono>
 #include <string>
 
 #include <json/value.h>
@@ -13,6 +14,11 @@ Json::Value AskIndexDaemon(const std::string& type, const Json::Value& data);
 
 /// The same, but null when the daemon does not run.
 Json::Value AskIndexDaemonIfRunning(const std::string& type, const Json::Value& data);
+Json::Value AskNotificationDaemonIfRunning(const std::string& type, const Json::Value& data);
+
+/// Waits until what was changed before, in a share or ("") in all, is in the index.
+/// @throws Failure, with reason and remedy, when that is not so within the time.
+void AwaitChanges(const std::string& share, std::chrono::seconds longest);
 
 /// For operations that need a daemon at their end: better nothing is begun without it.
 /// @throws Failure when it does not run or does not answer.

@@ -18,6 +18,8 @@ const Option* FindOption(const Command& command, const std::string& name) {
   return name == kHelpOption.name ? &kHelpOption : nullptr;
 }
 
+bool IsOptional(const char* value) { return value[0] == '['; }
+
 void CheckChoice(const Option& option, const std::string& given) {
   const std::string value = option.value;
   if (value.find('|') == std::string::npos) return;
@@ -35,8 +37,8 @@ void TakeOption(const Command& command, const std::vector<std::string>& given, s
   if (option->value == nullptr) {
     if (equals != std::string::npos) throw UsageError(name + " takes no value");
     arguments.options[name] = "";
-  } else if (equals != std::string::npos) {
-    arguments.options[name] = given[at].substr(equals + 1);
+  } else if (equals != std::string::npos || IsOptional(option->value)) {
+    arguments.options[name] = equals == std::string::npos ? "" : given[at].substr(equals + 1);
   } else {
     if (at + 1 == given.size()) throw UsageError(name + " needs a value: " + name + " " + option->value);
     arguments.options[name] = given[++at];
@@ -58,7 +60,8 @@ struct WordLimits {
 };
 
 std::string OptionText(const Option& option) {
-  return option.value == nullptr ? option.name : std::string(option.name) + " " + option.value;
+  if (option.value == nullptr) return option.name;
+  return std::string(option.name) + (IsOptional(option.value) ? "" : " ") + option.value;
 }
 
 }  // namespace

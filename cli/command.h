@@ -7,7 +7,7 @@
 
 namespace ferrox::cli {
 
-enum ExitCode { kDone = 0, kNothingFound = 1, kWrongUsage = 2, kFailure = 3 };
+enum ExitCode { kDone = 0, kNothingFound = 1, kWrongUsage = 2, kFailure = 3, kNotFresh = 4 };
 
 /// The command line cannot be understood: exit code 2.
 class UsageError : public std::runtime_error {
@@ -23,8 +23,10 @@ class Failure : public std::runtime_error {
 
 /// An option of a command, such as "--limit N".
 struct Option {
-  const char* name;   ///< "--limit"
-  const char* value;  ///< "N", or what can be given, "name|date"; null: the option takes none
+  const char* name;  ///< "--limit"
+  /// "N", or what can be given, "name|date"; null: the option takes none; "[=N]": it can be left out, and only "="
+  /// gives it.
+  const char* value;
   const char* help;
 };
 

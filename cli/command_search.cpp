@@ -1,5 +1,6 @@
 #include <unistd.h>
 
+#include <chrono>
 #include <cstdio>
 
 #include "cli/ask.h"
@@ -16,6 +17,8 @@ namespace {
 
 constexpr long long kLimitDefault = 10;
 constexpr long long kLimitMax = 1000;
+constexpr long long kFreshSeconds = 30;
+constexpr long long kFreshSecondsMax = 600;
 /// What the engine puts around a match. Not shown: each becomes what the output can show.
 constexpr char kMarkStart = '\x02';
 constexpr char kMarkEnd = '\x03';
@@ -97,10 +100,23 @@ void PrintNothingFound(const Json::Value& result) {
   (void)fprintf(stderr, "nothing found%s\n", similar.c_str());
 }
 
+/// Whether the index is known to hold all that was changed before; says why not.
+bool IsFresh(const Arguments& arguments) try {
+  const bool given = !arguments.Get("--fresh").empty();
+  AwaitChanges(arguments.Get("--share"),
+               std::chrono::seconds(given ? arguments.Number("--fresh", 0, 0, kFreshSecondsMax) : kFreshSeconds));
+  return true;
+} catch (const Failure& failure) {
+  (void)fprintf(stderr, "fileindexctl: %s\nWithout --fresh the search shows what is indexed by now.\n",
+                EscapeForTerminal(failure.what()).c_str());
+  return false;
+}
+
 }  // namespace
 
 int RunSearch(const Arguments& arguments) {
   const Json::Value request = SearchRequest(arguments);
+  if (arguments.Has("--fresh") && !IsFresh(arguments)) return kNotFresh;
   const Json::Value result = AskEngine("search", request);
   const uint64_t hits = result["hits"].isArray() ? result["hits"].size() : 0;
   if (arguments.Has("--json")) {

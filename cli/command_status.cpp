@@ -7,6 +7,7 @@
 #include "cli/explain.h"
 #include "cli/format.h"
 #include "cli/progress.h"
+#include "cli/watching.h"
 #include "common/clock.h"
 #include "fileindex/folder_mgr.h"
 
@@ -27,15 +28,9 @@ void PrintReasons(const char* title, const Json::Value& counts, const Json::Valu
 
 std::string FoldersText(uint64_t folders) { return Count(folders) + (folders == 1 ? " folder" : " folders"); }
 
-/// How changes are noticed.
-std::string WatchText(const std::string& watch) {
-  return watch == "none" ? "changes are not watched, 'fileindexctl index' looks for them" : "changes by " + watch;
-}
-
 void PrintWork(const Json::Value& share) {
   (void)printf("    %s", EscapeForTerminal(Progress::Text(share, 0)).c_str());
   if (share.isMember("folders")) (void)printf("; %s", FoldersText(UintOf(share, "folders")).c_str());
-  if (share.isMember("watch")) (void)printf("; %s", EscapeForTerminal(WatchText(TextOf(share, "watch"))).c_str());
   (void)printf("\n    done since the daemon started: %s indexed, %s removed", Count(UintOf(share, "written")).c_str(),
                Count(UintOf(share, "deleted")).c_str());
   if (share["rate"].isNumeric() && share["rate"].asDouble() >= 0.5) {
@@ -45,10 +40,11 @@ void PrintWork(const Json::Value& share) {
   (void)printf("\n");
 }
 
-void PrintShare(const Json::Value& share) {
+void PrintShare(const Json::Value& share, bool changes_noticed) {
   (void)printf("share %s: %s\n", EscapeForTerminal(TextOf(share, "share")).c_str(),
                EscapeForTerminal(TextOf(share, "path")).c_str());
   PrintWork(share);
+  (void)fputs(WatchLines(share, changes_noticed).c_str(), stdout);
   const Json::Value& index = share["index"];
   if (index.isObject()) {
     (void)printf("    index: %s documents, %s, %s\n", Count(UintOf(index, "documents")).c_str(),
@@ -109,6 +105,15 @@ Json::Value EngineState() {
   }
 }
 
+/// The notification daemon's "status" reply, or null when it does not run.
+Json::Value NotificationDaemonState() {
+  try {
+    return AskNotificationDaemonIfRunning("status", Json::Value());
+  } catch (const Failure&) {
+    return Json::Value();  // it does not answer; what the others say is worth showing
+  }
+}
+
 constexpr char kStopped[] = "does not run; start it with 'fileindexctl up'";
 
 std::string EngineText(const Json::Value& engine) {
@@ -125,23 +130,29 @@ std::string DaemonText(const Json::Value& daemon, bool needed) {
 
 int RunStatus(const Arguments& arguments) {
   const Json::Value engine = EngineState();
-  const Json::Value daemon = AskIndexDaemonIfRunning("status", Json::Value());
+  Json::Value daemon = AskIndexDaemonIfRunning("status", Json::Value());
+  const Json::Value notification_daemon = NotificationDaemonState();
+  AddWatches(notification_daemon, daemon);
   std::string problem;
   const Json::Value resting = RestingShares(daemon, problem);
   if (arguments.Has("--json")) {
     Json::Value json;
     json["engine"] = engine;
     json["index_daemon"] = daemon;
+    json["notification_daemon"] = notification_daemon;
     json["resting_shares"] = resting;
     if (!problem.empty()) json["problem"] = problem;
     (void)printf("%s\n", ToScriptJson(json).c_str());
     return kDone;
   }
   (void)printf("search engine: %s\n", EngineText(engine).c_str());
-  (void)printf("index daemon: %s\n", DaemonText(daemon, !resting.empty() || !problem.empty()).c_str());
+  const bool needed = !resting.empty() || !problem.empty();
+  (void)printf("index daemon: %s\n", DaemonText(daemon, needed).c_str());
+  const bool has_shares = !daemon.isNull() && !daemon["shares"].empty();
+  (void)printf("notification daemon: %s\n", NotificationDaemonText(notification_daemon, needed || has_shares).c_str());
   if (!problem.empty()) (void)printf("indexed folders: %s\n", EscapeForTerminal(problem).c_str());
   if (!daemon.isNull()) {
-    for (const Json::Value& share : daemon["shares"]) PrintShare(share);
+    for (const Json::Value& share : daemon["shares"]) PrintShare(share, !notification_daemon.isNull());
   }
   for (const Json::Value& share : resting) {
     (void)printf("share %s: %s; %s\n", EscapeForTerminal(TextOf(share, "share")).c_str(),

@@ -44,6 +44,8 @@ CommandGroup Searching() {
                 {"--limit", "N", "show at most so many hits (default 10, at most 1000)"},
                 {"--offset", "N", "leave out the first N hits"},
                 {"--sort", "relevance|date|name|size", "the order (default: relevance)"},
+                {"--fresh", "[=SECONDS]",
+                 "wait until all that was changed before can be found (default 30); exit code 4 when that is not sure"},
                 kJson},
                "Finds files. All words must match; \"a phrase\", prefix*, OR, NOT, ( ), kind:, ext:, path:, size: and "
                "date: work.",

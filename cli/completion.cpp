@@ -108,7 +108,7 @@ Words ArgumentWords(const Command& command, const Words& given) {
     if (known != nullptr) continue;  // this word is an option's value
     if (given[i].compare(0, 2, "--") != 0) ++place;
     for (const Option& option : command.options) {
-      if (given[i] == option.name && option.value != nullptr) pending = &option;
+      if (given[i] == option.name && option.value != nullptr && option.value[0] != '[') pending = &option;
     }
   }
   if (pending != nullptr) return Candidates(pending->value, typed);

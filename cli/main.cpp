@@ -36,7 +36,7 @@ std::string Overview() {
          "  --root DIR   the instance's folder (default: the environment variable FERROX_ROOT, else the host's own)\n"
          "  --version    the version\n"
          "  --help       this text, or after a command that command's help\n"
-         "Exit codes: 0 done, 1 nothing found, 2 wrong usage, 3 failure.\n";
+         "Exit codes: 0 done, 1 nothing found, 2 wrong usage, 3 failure, 4 not known to be fresh.\n";
 }
 
 /// Takes the options that stand before the command. True when one of them has done all there was to do.

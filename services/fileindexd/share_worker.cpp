@@ -425,7 +425,7 @@ Json::Value ShareWorker::Status() {
   json["share"] = share_;
   json["path"] = root_;
   json["folders"] = Json::UInt64(folder_count_);
-  json["watch"] = "none";  // nothing watches the file systems yet
+  json["queue"] = queue_path_;
   // The worker may not have noticed yet that the pause is over.
   const bool pause_over = json["state"] == "paused" && !json.isMember("detail") && !environment_.pause.Paused();
   if (pause_over) json["state"] = "starting";

@@ -4,8 +4,11 @@ import json
 import os
 import re
 import shutil
+import socket
+import struct
 import subprocess
 import tempfile
+import threading
 import unittest
 
 BIN = os.environ.get("FERROX_BIN", "")
@@ -17,6 +20,45 @@ def write_json(path, value):
     os.makedirs(os.path.dirname(path), exist_ok=True)
     with open(path, "w", encoding="utf-8") as file:
         json.dump(value, file)
+
+
+class FakeDaemon:
+    """Answers each command by what `answers` has for it, and notes what it was asked."""
+
+    def __init__(self, root, name, answers):
+        self.answers, self.asked = answers, []
+        os.makedirs(f"{root}/var/run", exist_ok=True)
+        self.path = f"{root}/var/run/{name}.sock"
+        self.socket = socket.socket(socket.AF_UNIX)
+        self.socket.bind(self.path)
+        self.socket.listen()
+        threading.Thread(target=self.serve, daemon=True).start()
+
+    def serve(self):
+        while True:
+            try:
+                connection, _ = self.socket.accept()
+            except OSError:
+                return
+            with connection, connection.makefile("rwb") as stream:
+                request = json.loads(stream.read(struct.unpack("=I", stream.read(4))[0]).rstrip(b"\0"))
+                command = request.get("type") or request["command"]
+                self.asked.append((command, request["data"]))
+                reply = json.dumps(self.answers[command]).encode()
+                stream.write(struct.pack("=I", len(reply)) + reply)
+
+    def close(self):
+        self.socket.shutdown(socket.SHUT_RDWR)
+        self.socket.close()
+        os.unlink(self.path)
+
+
+def success(data):
+    return {"success": True, "data": data}
+
+
+def failure(message):
+    return {"success": False, "error": {"code": 502, "msg": message}}
 
 
 class ToolTest(unittest.TestCase):
@@ -119,6 +161,67 @@ class ToolTest(unittest.TestCase):
                 done = self.run_tool(*words)
                 self.assertEqual(code, done.returncode, done.stderr)
                 self.assertIn(text, done.stderr.decode())
+
+    def daemon(self, name, **answers):
+        daemon = FakeDaemon(self.root, name, answers)
+        self.addCleanup(daemon.close)
+        return daemon
+
+    def test_fresh_search_asks_both_daemons_first_or_shows_nothing(self):
+        engine = self.daemon("kovaelasticd", search=success({"total": 1, "hits": [{"doc_id": "/v/f", "fields": {}}]}))
+        synced = success(None)
+        rows = [
+            ("notification daemon does not run", None, None),
+            ("the queue of photo is held", success({"problems": ["the queue of photo is held"]}), synced),
+            ("its root is away", failure("its root is away"), synced),
+            ("index daemon does not run", success({"problems": []}), None),
+            ("share photo: paused", success({"problems": []}), failure("share photo: paused")),
+            ("", success({"problems": []}), synced),
+        ]
+        for reason, noticed, indexed in rows:
+            daemons = [FakeDaemon(self.root, name, {"sync": answer}) if answer else None
+                       for name, answer in (("kovanotifyd", noticed), ("fileindexd", indexed))]
+            done = self.run_tool("search", "--fresh=7", "--share", "photo", "x")
+            for daemon in daemons:
+                if daemon:
+                    daemon.close()
+            with self.subTest(reason=reason):
+                self.assertEqual((4, b"") if reason else (0, done.stdout), (done.returncode, done.stdout), done.stderr)
+                self.assertIn(reason, done.stderr.decode())
+                self.assertEqual(bool(reason), b"Without --fresh" in done.stderr)
+                self.assertEqual([] if reason else ["search"], [command for command, _ in engine.asked])
+        (_, waited), (_, left) = daemons[0].asked + daemons[1].asked
+        self.assertEqual(7000, waited["timeout_ms"])
+        self.assertEqual(["photo"], left["shares"])
+        self.assertLessEqual(left["timeout_ms"], 7000)
+        self.assertEqual(2, self.run_tool("search", "--fresh=soon", "x").returncode)
+
+    def test_status_tells_how_changes_are_noticed(self):
+        shares = [{"share": name, "path": "/v/" + name, "queue": "/q/" + name, "state": "idle", "oldest_change": 2000,
+                   "failures": {}} for name in ("same", "differ", "none")]
+        self.daemon("fileindexd", status=success({"pid": 5, "workers": 2, "paused": False, "shares": shares}))
+        self.assertIn(b"notification daemon: does not run, so that", self.run_tool("status").stdout)
+        folder = {"path": "/v/a", "watch": "inotify", "reason": "fanotify is missing", "covered": True}
+        other = {"path": "/v/b", "watch": "fanotify", "reason": "", "covered": False}
+        queues = [
+            {"queue": "/q/same", "application": "fileindex", "watches": [folder, dict(folder, path="/v/c")], "held": 3,
+             "held_since": 1000, "held_reason": "the disk is full"},
+            {"queue": "/q/differ", "application": "fileindex", "watches": [folder, other], "held": 0, "held_since": 0},
+            {"queue": "/q/none", "application": "another", "watches": [folder], "held": 0, "held_since": 0}]
+        self.daemon("kovanotifyd", status=success({"pid": 6, "queues": queues, "lost": 0, "changes": 9,
+                                                   "problems": ["/x cannot be read"]}))
+        shown = self.run_tool("status").stdout.decode()
+        for expected in ("notification daemon: runs, process 6, 9 changes noticed\n    /x cannot be read\n",
+                         "    changes by inotify (fanotify is missing)\n    held in memory: 3, the oldest for ",
+                         ": the disk is full\n",
+                         "    changes in /v/a by inotify (fanotify is missing)\n"
+                         "    changes in /v/b by fanotify, not yet everywhere\n",
+                         "    changes are not noticed, 'fileindexctl index' looks for them: nobody asked"):
+            self.assertIn(expected, shown)
+        status = json.loads(self.run_tool("status", "--json").stdout)
+        self.assertEqual(6, status["notification_daemon"]["pid"])
+        self.assertEqual([(queues[0], 1000), (queues[1], 2000), (None, 2000)],
+                         [(share["watch"], share["oldest_change"]) for share in status["index_daemon"]["shares"]])
 
     def test_every_command_has_help_and_stands_in_the_manual(self):
         with open(f"{SOURCE}/docs/man/fileindexctl.1", encoding="utf-8") as file:
