@@ -11,6 +11,7 @@
 
 #include "common/clock.h"
 #include "common/log.h"
+#include "common/unique_fd.h"
 
 namespace ferrox {
 
@@ -67,6 +68,25 @@ LockFile::LockFile(const std::string& path, bool exclusive) : path_(path) {
     if (!locked) WaitForNextAttempt();
   }
   FERROX_FAIL_IF_AS(true, "kAttempts <= attempt", Error::kLockFailed, "Exceed max retry, path=" + path_);
+}
+
+std::unique_ptr<LockFile> LockFile::Try(const std::string& path, bool exclusive) {
+  std::unique_ptr<LockFile> lock(new LockFile);
+  for (int attempt = 0; attempt < kAttempts; ++attempt) {
+    UniqueFd file(OpenLockFile(path));
+    if (!file.Valid()) return nullptr;
+    if (!IsRegular(file.Get())) {
+      errno = EINVAL;
+      return nullptr;
+    }
+    if (flock(file.Get(), (exclusive ? LOCK_EX : LOCK_SH) | LOCK_NB) != 0) return nullptr;
+    if (!IsStillAt(file.Get(), path)) continue;  // a renamed file frees its path at once
+    lock->fd_ = file.Release();
+    lock->path_ = path;
+    return lock;
+  }
+  errno = EWOULDBLOCK;
+  return nullptr;
 }
 
 LockFile::~LockFile() {

@@ -1,5 +1,6 @@
 #pragma once
 
+#include <memory>
 #include <string>
 
 #include "common/export.h"
@@ -15,6 +16,9 @@ class FERROX_EXPORT LockFile {
   /// serves. Blocks while the lock is held elsewhere: 64 attempts, 0 to 0.9 s apart, at most about 58 s.
   /// @throws Error kLockFailed when the file cannot be opened, is no regular file, or stays locked.
   LockFile(const std::string& path, bool exclusive);
+  /// The lock if it can be had at once; else null, with errno set: EWOULDBLOCK while it is held elsewhere. Logs
+  /// nothing.
+  static std::unique_ptr<LockFile> Try(const std::string& path, bool exclusive);
   LockFile(const LockFile&) = delete;
   LockFile& operator=(const LockFile&) = delete;
   ~LockFile();
@@ -23,6 +27,8 @@ class FERROX_EXPORT LockFile {
   int Descriptor() const { return fd_; }
 
  private:
+  LockFile() = default;
+
   int fd_ = -1;
   std::string path_;
 };

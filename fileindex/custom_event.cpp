@@ -2,8 +2,6 @@
 
 #include "fileindex/custom_event.h"
 
-#include <fcntl.h>
-#include <sys/stat.h>
 #include <syslog.h>
 #include <unistd.h>
 
@@ -14,10 +12,10 @@
 #include <json/value.h>
 
 #include "common/json_util.h"
+#include "common/line_file.h"
 #include "common/lock_file.h"
 #include "common/log.h"
 #include "common/new_class.h"
-#include "common/unique_fd.h"
 #include "fileindex/optree.h"
 #include "fileindex/path_table.h"
 #include "fileindex/queue_mgr.h"
@@ -38,35 +36,6 @@ std::string EventLine(int event, const std::string& path, const std::string& pat
   return toString(line) + "\n";
 }
 
-/// Whether the file's last line lacks its end: a writer died in it, and the next line must not be glued to it.
-bool EndsInHalfLine(int fd, off_t size) {
-  char last = '\n';
-  return size > 0 && pread(fd, &last, 1, size - 1) == 1 && last != '\n';
-}
-
-/// Takes back what a failed write left, unless somebody else has written behind it.
-void TakeBack(int fd, off_t size_before, ssize_t written) {
-  struct stat now = {};
-  if (written <= 0 || fstat(fd, &now) != 0 || now.st_size != size_before + written) return;
-  if (ftruncate(fd, size_before) != 0) Log(LOG_ERR, "cannot take back half a queue line: %m");
-}
-
-/// Appends the line to the queue, whose lock the caller holds, with one write: it is there whole or not at all.
-void AppendLine(const std::string& queue_path, std::string line) {
-  const UniqueFd queue(open(queue_path.c_str(), O_RDWR | O_CREAT | O_APPEND | O_CLOEXEC | O_NOFOLLOW, 0644));
-  struct stat before = {};
-  FERROX_FAIL_IF(!queue.Valid() || fstat(queue.Get(), &before) != 0, Error::kInternal,
-                 "Failed to open queue, reason=" + ErrnoText());
-  if (EndsInHalfLine(queue.Get(), before.st_size)) line.insert(0, "\n");
-  errno = 0;
-  const ssize_t written = write(queue.Get(), line.data(), line.size());
-  if (written == static_cast<ssize_t>(line.size())) return;
-  const int write_errno = errno != 0 ? errno : ENOSPC;
-  TakeBack(queue.Get(), before.st_size, written);
-  errno = write_errno;
-  FERROX_FAIL_IF_AS(true, "written != line.size()", Error::kInternal, "Failed to write queue, reason=" + ErrnoText());
-}
-
 /// Says, given a queue, whether a reindex that waits in it will see whatever the event would tell.
 using IsCovered = std::function<bool(const std::string& queue_path)>;
 
@@ -75,7 +44,7 @@ void QueueEvent(const std::string& queue_path, const std::string& path, const st
   if (is_covered(queue_path)) return;
   FERROX_FAIL_IF(line.size() - 1 > kQueueLineMaxBytes, Error::kInternal, "Event too long for a queue, path=" + path);
   const LockFile lock(queue_path, true);
-  AppendLine(queue_path, line);
+  FERROX_FAIL_IF(!AppendLines(queue_path, line), Error::kInternal, "Failed to write queue, reason=" + ErrnoText());
 }
 
 /// Queues the event; when that fails, the share is marked instead.
