@@ -9,6 +9,7 @@
 #include "common/clock.h"
 #include "common/error.h"
 #include "common/paths.h"
+#include "fileindex/folder_mgr.h"
 #include "fileindex/index_mgr.h"
 #include "fileindex/status_mgr.h"
 #include "platform/host/child_service.h"
@@ -25,9 +26,10 @@ struct Service {
   int option;
 };
 
-/// In the order in which they start; the index daemon needs the engine.
+/// In the order in which they start; the index daemon needs the engine, and is told of changes.
 constexpr Service kServices[] = {
     {"kovaelasticd", "search engine", &KLIBServiceStart, &KLIBServiceStop, 1},
+    {"kovanotifyd", "notification daemon", &KLIBServiceStart, &KLIBServiceStop, 1},
     {"pkg-Ferrox-fileindexd", "index daemon", &KLIBServicectlStart, &KLIBServicectlStop, KLIB_SERVICECTL_UPSTART},
 };
 
@@ -73,6 +75,7 @@ int RunDown(const Arguments&) {
 /// Goes by the list of indexed folders, and never fails for a service: what runs then is told.
 int RunPrepare(const Arguments&) {
   fileindex::PrepareServices();
+  if (!fileindex::FolderMgr().GetFolders().empty()) (void)KLIBServiceStart("kovanotifyd", 1);
   for (const Service& service : kServices) {
     (void)printf("%s: %s\n", service.label, KLIBServiceIsRunning(service.name) == 1 ? "runs" : "does not run");
   }

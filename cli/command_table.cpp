@@ -9,30 +9,34 @@ const Option kAccounts = {"--accounts", "local|domain|ldap", "whose homes (defau
 const Option kName = {"--name", "NAME", "what people call it (default: the last part of the path)"};
 
 CommandGroup Services() {
-  return {
-      "The service",
-      {
-          {"up", "", {}, "Starts the search engine and the index daemon, and waits until they answer.", &RunUp, true},
-          {"down", "", {}, "Stops both.", &RunDown},
-          {"status",
-           "",
-           {kJson},
-           "Shows what runs, and for each share what is indexed, queued and failed.",
-           &RunStatus},
-          {"pause",
-           "[HOURS]",
-           {},
-           "Pauses indexing, for some hours or until 'resume'. Searching goes on.",
-           &RunPause,
-           true},
-          {"resume", "", {}, "Ends a pause.", &RunResume, true},
-          {"prepare",
-           "",
-           {},
-           "Starts the services that indexing needs when folders are indexed, else stops them.",
-           &RunPrepare,
-           true},
-      }};
+  return {"The service",
+          {
+              {"up",
+               "",
+               {},
+               "Starts the search engine, the notification daemon and the index daemon, and waits until they answer.",
+               &RunUp,
+               true},
+              {"down", "", {}, "Stops them.", &RunDown},
+              {"status",
+               "",
+               {kJson},
+               "Shows what runs, and for each share what is indexed, queued and failed.",
+               &RunStatus},
+              {"pause",
+               "[HOURS]",
+               {},
+               "Pauses indexing, for some hours or until 'resume'. Searching goes on.",
+               &RunPause,
+               true},
+              {"resume", "", {}, "Ends a pause.", &RunResume, true},
+              {"prepare",
+               "",
+               {},
+               "Starts the services that indexing needs when folders are indexed, else stops them.",
+               &RunPrepare,
+               true},
+          }};
 }
 
 CommandGroup Searching() {

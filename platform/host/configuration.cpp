@@ -25,6 +25,13 @@ bool ReadSamba(const Json::Value& object, Configuration::Samba& samba) {
          ReadPath(object, "testparm", samba.testparm) && ReadPath(object, "smbcontrol", samba.smbcontrol);
 }
 
+bool ReadNotifyd(const Json::Value& object, Configuration::Notifyd& notifyd) {
+  constexpr uint32_t kScanIntervalMinSec = 1;
+  return object.isObject() && ReadMember(object, "watch", notifyd.watch) &&
+         ReadMember(object, "scan_interval", notifyd.scan_interval_sec) &&
+         notifyd.scan_interval_sec >= kScanIntervalMinSec;
+}
+
 Configuration Load(const std::string& path) {
   Configuration configuration;
   configuration.samba.config = InstanceRoot() + "/etc/samba/smb.conf";
@@ -33,7 +40,8 @@ Configuration Load(const std::string& path) {
   configuration.problem = ReadJsonFile(path, value);
   if (!configuration.problem.empty() || value.isNull()) return configuration;
   const bool read = value.isObject() && ReadMember(value, "admin_group", configuration.admin_group) &&
-                    (!value.isMember("samba") || ReadSamba(value["samba"], configuration.samba));
+                    (!value.isMember("samba") || ReadSamba(value["samba"], configuration.samba)) &&
+                    (!value.isMember("notifyd") || ReadNotifyd(value["notifyd"], configuration.notifyd));
   if (!read) configuration.problem = "is not an object of settings, or one has the wrong type";
   return configuration;
 }

@@ -1,7 +1,9 @@
 #pragma once
 
+#include <cstdint>
 #include <memory>
 #include <string>
+#include <vector>
 
 /// What the host's administrator may set: the JSON object in "/etc/kova/kova.json" below the instance's root.
 ///   {"admin_group": "sudo", "samba": {"shares": true}}
@@ -16,6 +18,11 @@ struct Configuration {
     /// What reaches its running processes; empty in an instance that is not the host's own, unless it is set.
     std::string smbcontrol;
   } samba = {};
+  struct Notifyd {
+    /// By which ways the notification daemon may watch folders.
+    std::vector<std::string> watch = {"fanotify", "fanotify inode marks", "inotify", "periodic scan"};
+    uint32_t scan_interval_sec = 600;  ///< between the scans of what it cannot watch
+  } notifyd = {};
   std::string problem = {};
 };
 

@@ -2,6 +2,7 @@
 
 #include <cstdint>
 #include <string>
+#include <vector>
 
 #include <json/value.h>
 
@@ -26,6 +27,18 @@ inline bool ReadMember(const Json::Value& object, const char* key, uint32_t& out
   if (!object.isMember(key)) return true;
   if (!object[key].isUInt()) return false;
   out = object[key].asUInt();
+  return true;
+}
+
+/// An array of texts.
+inline bool ReadMember(const Json::Value& object, const char* key, std::vector<std::string>& out) {
+  if (!object.isMember(key)) return true;
+  if (!object[key].isArray()) return false;
+  out.clear();
+  for (const Json::Value& element : object[key]) {
+    if (!element.isString()) return false;
+    out.push_back(element.asString());
+  }
   return true;
 }
 

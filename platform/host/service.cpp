@@ -16,7 +16,7 @@ namespace {
 constexpr ServiceRow kServices[] = {
     {"kovaelasticd", "kovaelasticd", "/var/run/kovaelasticd.sock", "kovaelasticd.service"},
     {"pkg-Ferrox-fileindexd", "fileindexd", "/var/run/fileindexd.sock", "fileindexd.service"},
-    {"kovanotifyd", "kovanotifyd", nullptr, "kovanotifyd.service"},
+    {"kovanotifyd", "kovanotifyd", "/var/run/kovanotifyd.sock", "kovanotifyd.service"},
     {"kovacontentextractd", "kovacontentextractd", nullptr, "kovacontentextractd.service"},
 };
 /// The file-sharing service is the host's own; an instance cannot switch it.

@@ -9,37 +9,37 @@ trap 'rm -rf "$system"' EXIT
 debootstrap --variant=minbase --include=systemd,systemd-sysv,libjsoncpp25,libsqlite3-0,libzstd1,libuchardet0 bookworm \
   "$system" >"$build/systemd-image.log"
 DESTDIR=$system cmake --install "$build" --prefix /usr >/dev/null
-systemctl --root="$system" --quiet enable kovaelasticd.service fileindex-prepare.service
+systemctl --root="$system" --quiet enable kovaelasticd.service kovanotifyd.service fileindex-prepare.service
 
 cat >"$system/walk" <<'WALK'
 #!/bin/bash
 trap 'systemctl poweroff --no-block' EXIT
 set -eux
-expect() { [[ "$(systemctl is-active kovaelasticd.service fileindexd.service | tr '\n' ' ')" == "$* " ]]; }
+expect() { [[ "$(systemctl is-active kovaelasticd.service kovanotifyd.service fileindexd.service | tr '\n' ' ')" == "$* " ]]; }
 finds() { for _ in {1..50}; do fileindexctl search "$1" && return; sleep 0.1; done; false; }
 if [[ ! -e /srv/docs ]]; then
   mkdir -p /srv/docs
   echo lantern >/srv/docs/a.txt
   sleep 1
-  expect active inactive
+  expect active active inactive
   [[ -e /tmp/ferrox_cfg_folder.lock ]]
   fileindexctl up
   fileindexctl share add /srv/docs
-  expect active active
+  expect active active active
   finds lantern
   systemctl kill -s KILL fileindexd.service
   sleep 3
-  expect active active
+  expect active active active
   fileindexctl folder delete /docs
-  expect active inactive
+  expect active active inactive
   fileindexctl folder add /docs
-  expect active active
+  expect active active active
   echo "first boot done"
 else
-  expect active active
+  expect active active active
   finds lantern
   fileindexctl down
-  expect inactive inactive
+  expect inactive inactive inactive
   echo "second boot done"
 fi
 WALK

@@ -14,12 +14,15 @@ HEADER_LEVELS = {"optree": 0, "util": 0, "queue_mgr": 1, "status_mgr": 1, "elast
                  "index_mgr": 4}
 # Two sources reach right: a custom event needs the queue and, when it cannot be written, the share's status; a queue
 # that is being read keeps the folders' configuration alive. The tool keeps the host's own table of shares, the index
-# daemon watches it, and the tool tells why a service of the host did not start.
+# daemon watches it, the notification daemon reads the host's registry and settings, and the tool tells why a service of
+# the host did not start.
 EXCEPTIONS = {("fileindex/custom_event.cpp", "fileindex/queue_mgr.h"),
               ("fileindex/custom_event.cpp", "fileindex/status_mgr.h"),
               ("fileindex/queue_mgr.cpp", "fileindex/folder_mgr.h"),
               ("cli/own_share.h", "platform/host/share_table.h"),
               ("services/fileindexd/main.cpp", "platform/host/share_table.h"),
+              ("services/kovanotifyd/main.cpp", "platform/host/configuration.h"),
+              ("services/kovanotifyd/main.cpp", "platform/host/notify_registry.h"),
               ("cli/command_service.cpp", "platform/host/child_service.h")}
 
 

@@ -1,0 +1,21 @@
+#include "services/kovanotifyd/cookie.h"
+
+#include <fcntl.h>
+#include <sys/stat.h>
+
+#include "common/file_util.h"
+#include "common/log.h"
+#include "services/support/daemon.h"
+
+namespace ferrox::notifyd {
+
+/// Open for reading, so that its closing is no end of a write.
+Cookie::Cookie(const std::string& path) : path_(path) {
+  (void)services::MakeFolders(Dirname(path));
+  file_.Reset(open(path.c_str(), O_RDONLY | O_CREAT | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK, 0600));
+  FERROX_FAIL_IF(!file_.Valid(), Error::kInternal, "cannot make " + path + ": " + ErrnoText());
+}
+
+bool Cookie::Touch() const { return futimens(file_.Get(), nullptr) == 0; }
+
+}  // namespace ferrox::notifyd

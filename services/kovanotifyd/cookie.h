@@ -1,0 +1,25 @@
+#pragma once
+
+#include <string>
+
+#include "common/unique_fd.h"
+
+namespace ferrox::notifyd {
+
+/// A file whose times are set to find out how far a watcher is: nothing is written, so a full disk is no obstacle.
+class Cookie {
+ public:
+  /// Makes the file, and the folders above it, when it is missing.
+  /// @throws Error kInternal when that fails.
+  explicit Cookie(const std::string& path);
+
+  const std::string& Path() const { return path_; }
+  /// False, with errno set, when it fails.
+  bool Touch() const;
+
+ private:
+  std::string path_;
+  UniqueFd file_;
+};
+
+}  // namespace ferrox::notifyd

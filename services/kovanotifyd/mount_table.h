@@ -1,0 +1,43 @@
+#pragma once
+
+#include <cstdint>
+#include <map>
+#include <string>
+#include <vector>
+
+#include "common/unique_fd.h"
+
+namespace ferrox::notifyd {
+
+/// A mount, as it was when it was looked up.
+struct Mount {
+  uint64_t id = 0;
+  std::string entry = {};              ///< what names it in the table beside its id, which may be given to another one
+  std::vector<uint64_t> beneath = {};  ///< the mounts that it lies on, nearest first
+};
+
+/// The mounts that this process sees.
+class MountTable {
+ public:
+  explicit MountTable(const char* path = "/proc/self/mountinfo");
+
+  /// Has something to tell (POLLPRI) after a mount or an unmount; -1 where that cannot be seen.
+  int Fd() const { return fd_.Get(); }
+  void Read();
+
+  /// Without an entry when there is none of that id.
+  Mount Find(uint64_t id) const;
+  bool IsMounted(const Mount& mount) const;
+
+ private:
+  struct Line {
+    uint64_t parent = 0;
+    std::string entry;
+  };
+
+  std::string path_;
+  UniqueFd fd_;
+  std::map<uint64_t, Line> lines_;
+};
+
+}  // namespace ferrox::notifyd

@@ -1,0 +1,62 @@
+#include "services/kovanotifyd/ways.h"
+
+#include <algorithm>
+
+#include "common/file_util.h"
+#include "common/paths.h"
+
+namespace ferrox::notifyd {
+
+namespace {
+
+struct KnownWay {
+  const char* name;
+  const char* cookie;
+  std::unique_ptr<Watcher> (*make)(const std::string& cookie_path);
+};
+
+constexpr char kCookies[] = "/var/lib/kova/notifyd/cookies/";
+
+/// The best first.
+constexpr KnownWay kWays[] = {
+    {"fanotify", "fanotify", nullptr},
+    {"fanotify inode marks", "inode_marks", nullptr},
+    {"inotify", "inotify", nullptr},
+};
+
+bool IsKnown(const std::string& name) {
+  return name == kPeriodicScan ||
+         std::any_of(std::begin(kWays), std::end(kWays), [&name](const KnownWay& way) { return name == way.name; });
+}
+
+}  // namespace
+
+void ChooseWays(const std::vector<std::string>& allowed, Notifier::Options& options) {
+  const auto is_allowed = [&allowed](const char* name) {
+    return std::find(allowed.begin(), allowed.end(), name) != allowed.end();
+  };
+  for (const std::string& name : allowed) {
+    if (!IsKnown(name)) options.problems.push_back("\"" + name + "\" in the settings is no way to watch folders");
+  }
+  for (const KnownWay& known : kWays) {
+    Way way = {known.name, nullptr, "switched off in the settings"};
+    Cookie cookie(InstancePath((std::string(kCookies) + known.cookie).c_str()));
+    if (is_allowed(known.name) && known.make != nullptr) way.watcher = known.make(cookie.Path());
+    options.ways.push_back(std::move(way));
+    options.cookies.push_back(std::move(cookie));
+  }
+  options.scans = is_allowed(kPeriodicScan);
+}
+
+std::vector<std::string> OwnPaths() {
+  std::vector<std::string> paths;
+  for (const char* folder : {"/var/lib/kova", "/var/log/kova", kConfigurationFolder, "/var/run"}) {
+    const std::string path = InstancePath(folder);
+    const std::string real = RealPath(path);
+    paths.push_back((real.empty() ? path : real) + "/");
+  }
+  paths.push_back(RealPath(InstancePath("/tmp")) + "/ferrox_cfg_");
+  return paths;
+}
+
+}  // namespace ferrox::notifyd
