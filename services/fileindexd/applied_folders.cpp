@@ -9,25 +9,37 @@
 
 namespace ferrox::indexd {
 
+namespace {
+
+constexpr char kMountPoint[] = "mount_point";
+
+}  // namespace
+
 AppliedFolders::AppliedFolders(const std::string& path) : path_(path) {
   Json::Value stored;
   if (!fromFile(stored, path_)) return;
   try {
+    GetJsonValue(mount_point_, stored, kMountPoint, false);
+    stored.removeMember(kMountPoint);
     folders_ = ShareFolders::FromJson(stored);
   } catch (const Error&) {
     Log(LOG_WARNING, "%s is damaged; the folders of its share are compared with the index", path_.c_str());
   }
 }
 
-void AppliedFolders::Set(const ShareFolders& folders) {
-  const bool same = folders.DifferingFrom(folders_).empty();
+void AppliedFolders::Set(const ShareFolders& folders, const std::string& mount_point) {
+  const bool same = folders.DifferingFrom(folders_).empty() && mount_point == mount_point_;
   folders_ = folders;
-  if (!same && !toFile(folders.ToJson(), path_))
-    Log(LOG_ERR, "cannot write %s: %s", path_.c_str(), ErrnoText().c_str());
+  mount_point_ = mount_point;
+  if (same) return;
+  Json::Value stored = folders.ToJson();
+  if (!mount_point.empty()) stored[kMountPoint] = mount_point;
+  if (!toFile(stored, path_)) Log(LOG_ERR, "cannot write %s: %s", path_.c_str(), ErrnoText().c_str());
 }
 
 void AppliedFolders::Forget() {
   folders_ = ShareFolders();
+  mount_point_.clear();
   (void)Unlink(path_);
 }
 

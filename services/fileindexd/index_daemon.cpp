@@ -83,8 +83,10 @@ constexpr IndexDaemon::Command IndexDaemon::kCommands[] = {
 
 IndexDaemon::IndexDaemon(const Options& options)
     : pool_(ThreadsFor(options.workers)),
-      workers_([this](const std::string& share) {
-        return std::make_unique<ShareWorker>(share, ShareWorker::Environment{pool_, pause_});
+      workers_([this, is_mount_point = options.is_mount_point](const std::string& share) {
+        ShareWorker::Environment environment{pool_, pause_};
+        environment.is_mount_point = is_mount_point;
+        return std::make_unique<ShareWorker>(share, environment);
       }),
       configuration_(FilesOf(options)) {
   AllowManyOpenFiles();

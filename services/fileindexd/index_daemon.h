@@ -30,6 +30,7 @@ class IndexDaemon {
     unsigned workers = 0;
     /// Files that change when shares do; without them that is noticed at intervals.
     std::vector<std::string> share_files = {};
+    IsMountPoint is_mount_point = &NothingMounted;
   };
 
   explicit IndexDaemon(const Options& options);

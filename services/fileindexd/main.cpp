@@ -5,6 +5,7 @@
 #include <exception>
 
 #include "common/paths.h"
+#include "platform/host/mounts.h"
 #include "platform/host/share_table.h"
 #include "services/fileindexd/index_daemon.h"
 #include "services/support/daemon.h"
@@ -47,6 +48,7 @@ int main(int argc, char** argv) try {
   }
   ferrox::services::Daemon daemon("fileindexd");
   options.share_files = {kova::host::ShareTablePath()};
+  options.is_mount_point = &kova::host::IsMountRoot;
   ferrox::indexd::IndexDaemon index_daemon(options);
   ferrox::services::FrameServerOptions server_options;
   server_options.socket_path = ferrox::InstancePath(ferrox::kFileIndexdSocket);

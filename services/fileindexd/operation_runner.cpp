@@ -92,6 +92,11 @@ void OperationRunner::KeepWhatIsDone() noexcept {
   }
 }
 
+void OperationRunner::CheckRoot() const {
+  FERROX_FAIL_IF(!context_.held.IsStillThere(), Error::kPathNotIndexable,
+                 "the share's folder was unmounted or replaced while it was looked at; it is looked at again");
+}
+
 /// What has been written becomes searchable and safe while a long pass goes on.
 void OperationRunner::CommitIfDue() {
   if (!writer_.HasUncommitted() || std::chrono::steady_clock::now() - last_commit_ < kCommitInterval) return;
@@ -251,6 +256,7 @@ void OperationRunner::CompareFolder(const std::string& folder) {
   };
   TreeWalk walk(folder, walk_rules);
   FERROX_FAIL_IF(!walk.Opened() && folder == context_.root, Error::kInternal, "the share's folder cannot be read");
+  CheckRoot();
 
   context_.status.BeginComparison(folder);
   CompareBelow(folder, walk, context_.index, Actions(folder));

@@ -16,6 +16,7 @@
 #include "services/fileindexd/path_rules.h"
 #include "services/fileindexd/share_folders.h"
 #include "services/fileindexd/share_index.h"
+#include "services/fileindexd/share_place.h"
 #include "services/fileindexd/share_status.h"
 #include "services/fileindexd/task_pool.h"
 
@@ -30,6 +31,7 @@ struct PassContext {
   TaskPool& pool;
   const Interruption& interruption;
   ShareStatus& status;
+  const HeldFolder& held;  ///< the share's folder
 };
 
 /// Carries the operations of one pass into the index, in two stages: first what removes and moves documents, in the
@@ -49,6 +51,10 @@ class OperationRunner {
            const std::vector<std::string>& also_compare);
   /// Commits what has been done, as far as that works at once. For a pass that ends early.
   void KeepWhatIsDone() noexcept;
+
+  /// @throws Error kPathNotIndexable when the share's folder is not the one any more at which the pass began: what was
+  /// not found may be anywhere.
+  void CheckRoot() const;
 
   /// Whether the queue held a reindex, which keeps the library from queuing what concerns the paths below it.
   bool HadReindex() const { return had_reindex_; }

@@ -36,10 +36,6 @@ bool AskAllRules(const std::string& folder) {
 }  // namespace
 
 std::string ShareProblem(const std::string& share, const std::string& root) {
-  struct stat status = {};
-  if (stat(root.c_str(), &status) != 0 || !S_ISDIR(status.st_mode)) {
-    return "its folder " + root + " is not there; mount it, or remove the share";
-  }
   const int type = KOVAGetFSType(root.c_str(), 0);
   if (type < 0 || type == KOVA_FS_PSEUDO) return root + " lies on a file system that holds no files of users";
   if (KOVAFSIsRemoteFS(type) != 0) return root + " lies on another machine; index it there";

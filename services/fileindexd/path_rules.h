@@ -9,8 +9,8 @@
 
 namespace ferrox::indexd {
 
-/// Why nothing of the share, whose folder is `root`, can be indexed now, "" when it can. @throws Error kNoSuchShare;
-/// kInternal.
+/// Why nothing of the share, whose folder is `root` and there, can be indexed now, "" when it can. @throws Error
+/// kNoSuchShare; kInternal.
 std::string ShareProblem(const std::string& share, const std::string& root);
 
 /// Decides which paths of one share are indexed: those under its indexed folders, unless the rules for names and places

@@ -13,8 +13,9 @@ constexpr size_t kExamplesKept = 3;
 constexpr size_t kReasonsKept = 100;
 
 const char* StateName(ShareStatus::State state) {
-  constexpr const char* kNames[] = {"starting",           "idle", "indexing", "paused", "waiting for space",
-                                    "waiting for engine", "error"};
+  constexpr const char* kNames[] = {
+      "starting",           "idle", "indexing", "paused", "waiting for space", "waiting for engine",
+      "waiting for volume", "error"};
   return kNames[static_cast<int>(state)];
 }
 

@@ -29,7 +29,16 @@ class Rate {
 /// What people can see of one share's indexing. Every call is safe from any thread.
 class ShareStatus {
  public:
-  enum class State { kStarting, kIdle, kIndexing, kPaused, kWaitingForSpace, kWaitingForEngine, kError };
+  enum class State {
+    kStarting,
+    kIdle,
+    kIndexing,
+    kPaused,
+    kWaitingForSpace,
+    kWaitingForEngine,
+    kWaitingForVolume,
+    kError
+  };
 
   /// `detail` says in a sentence why, for the states that wait.
   void SetState(State state, const std::string& detail = "");

@@ -212,6 +212,10 @@ milliseconds ShareWorker::OnFailure(const Error& error) {
   } catch (const Error&) {
     // The share is gone: said below, as the failure that it led to.
   }
+  if (away_ && error.Code() == Error::kPathNotIndexable) {
+    Tell(ShareStatus::State::kWaitingForVolume, error.what());
+    return delay_ = environment_.volume_poll;
+  }
   if (error.Code() == Error::kEngineUnreachable) {
     Tell(ShareStatus::State::kWaitingForEngine, "the search engine does not answer; start it with 'fileindexctl up'");
     return NextDelay(seconds(1), seconds(30));
@@ -271,6 +275,9 @@ milliseconds ShareWorker::NextDelay(milliseconds first, milliseconds last) {
 
 void ShareWorker::RunOnce() {
   CheckShare();
+  // Nobody may have noticed what became of it meanwhile.
+  if (away_) (void)Queue(fileindex::EVENT_REINDEX, root_);
+  away_ = false;
   (void)LoadFolders();  // the status tells how many there are
   EnsureIndex();
   const std::string detached = queue_path_ + ".tmp";
@@ -295,6 +302,9 @@ void ShareWorker::Gather() {
 void ShareWorker::CheckShare() {
   const sdk::SDKShare share(share_);
   FERROX_FAIL_IF(share.GetPath() != root_, Error::kNoSuchShare, "the share's folder is another one now");
+  const std::string absence = AbsenceOf(root_, applied_.MountPoint(), environment_.is_mount_point);
+  away_ = away_ || !absence.empty();
+  FERROX_FAIL_IF(!absence.empty(), Error::kPathNotIndexable, absence);
   FERROX_FAIL_IF(told_no_space_ && !share.IsSpaceEnough(), Error::kSpaceNotEnough, "still less than 100 MiB free");
   const std::string problem = ShareProblem(share_, root_);
   FERROX_FAIL_IF(!problem.empty(), Error::kPathNotIndexable, problem);
@@ -368,19 +378,23 @@ bool ShareWorker::Queue(int event, const std::string& path) {
 }
 
 void ShareWorker::RunPass() {
+  const HeldFolder held(root_);
+  const std::string mount_point = MountPointOf(root_, environment_.is_mount_point);
+  CheckShare();
   fileindex::QueueMgr queue(queue_path_);
   if (!queue.PrepareTmpQueue() && !IsFileExist(queue_path_ + ".tmp")) return;
   // Only now: of folders that are changed later, the events are in a later queue.
   const ShareFolders folders = LoadFolders();
-  OperationRunner runner({share_, root_, folders, *index_, environment_.pool, interruption_, status_});
+  OperationRunner runner({share_, root_, folders, *index_, environment_.pool, interruption_, status_, held});
   RunOperations(queue, runner, folders);
   // What went away in the meantime, with its volume for example, looked as if it had been deleted.
+  runner.CheckRoot();
   CheckShare();
   QueueAgainIfChanged(runner, folders);
   queue.DeleteTmp();
   // While the queue was still there, a change made since may have been taken for one that it covers.
   QueueAgainIfChanged(runner, folders);
-  applied_.Set(folders);
+  applied_.Set(folders, mount_point);
   status_.EndPass();
 }
 

@@ -18,6 +18,7 @@
 #include "services/fileindexd/queue_progress.h"
 #include "services/fileindexd/share_folders.h"
 #include "services/fileindexd/share_index.h"
+#include "services/fileindexd/share_place.h"
 #include "services/fileindexd/share_status.h"
 #include "services/fileindexd/task_pool.h"
 
@@ -55,6 +56,9 @@ class ShareWorker {
     /// While an operation goes on, an index may be missing or paused for a moment, or the event that tells of a rename.
     /// What takes longer than this was not finished.
     std::chrono::milliseconds patience = std::chrono::seconds(5);
+    IsMountPoint is_mount_point = &NothingMounted;
+    /// A volume that is away is looked for so often.
+    std::chrono::milliseconds volume_poll = std::chrono::seconds(2);
   };
 
   /// @throws Error kNoSuchShare; kInternal.
@@ -129,6 +133,7 @@ class ShareWorker {
   std::chrono::steady_clock::time_point failing_since_;  ///< with that failure
   std::chrono::milliseconds delay_{0};                   ///< grows while the same failure comes again
   bool told_no_space_ = false;
+  bool away_ = false;  ///< the share's folder, or its volume, was not there
   ShareStatus status_;
   FileWatch watch_;
   Interruption interruption_;

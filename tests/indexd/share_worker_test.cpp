@@ -142,15 +142,5 @@ TEST_F(ShareWorkerTest, PausedIndexIsResumedWhenNoFolderIsPaused) {
   WaitForState("idle");
 }
 
-TEST_F(ShareWorkerTest, MissingFolderIsNoDeletion) {
-  test::WriteFile(At("a"), "1");
-  Process(Line(kReindex, root));
-  fs::rename(root, root + ".away");
-  Queue(Line(kReindex, root));
-  EXPECT_THROW(worker->RunOnce(), Error);
-  EXPECT_EQ(1U, index->documents.size());
-  fs::rename(root + ".away", root);
-}
-
 }  // namespace
 }  // namespace ferrox::indexd

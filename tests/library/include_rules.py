@@ -23,6 +23,7 @@ EXCEPTIONS = {("fileindex/custom_event.cpp", "fileindex/queue_mgr.h"),
               ("services/fileindexd/main.cpp", "platform/host/share_table.h"),
               ("services/kovanotifyd/main.cpp", "platform/host/configuration.h"),
               ("services/kovanotifyd/main.cpp", "platform/host/notify_registry.h"),
+              ("services/fileindexd/main.cpp", "platform/host/mounts.h"),
               ("cli/command_service.cpp", "platform/host/child_service.h")}
 
 

@@ -1,0 +1,38 @@
+#pragma once
+
+#include <sys/stat.h>
+
+#include <functional>
+#include <string>
+
+#include "common/unique_fd.h"
+
+namespace ferrox::indexd {
+
+/// Whether something is mounted on a folder: 1, 0, or below 0 when that cannot be told.
+using IsMountPoint = std::function<int(const std::string& path)>;
+
+/// For those who know of none.
+inline int NothingMounted(const std::string&) { return 0; }
+
+/// Where the nearest mount at or above a folder is; "" for the root file system.
+std::string MountPointOf(const std::string& folder, const IsMountPoint& is_mount_point);
+
+/// Why what lies at `root`, the share's folder, is not what the index was made from, which lay in the mount at
+/// `mount_point` ("": none): the folder is missing, or it is the empty place of a volume that is not mounted. "" when
+/// nothing speaks against it; a folder with content is where the share is now, mounted or not.
+std::string AbsenceOf(const std::string& root, const std::string& mount_point, const IsMountPoint& is_mount_point);
+
+/// Holds on to the folder that a path leads to: it cannot be unmounted meanwhile but by force, and it can be told
+/// whether the path still leads there.
+class HeldFolder {
+ public:
+  explicit HeldFolder(const std::string& path);
+  bool IsStillThere() const;
+
+ private:
+  const std::string& path_;
+  UniqueFd fd_;
+};
+
+}  // namespace ferrox::indexd
