@@ -14,6 +14,7 @@ import unittest
 
 BIN = os.environ.get("FERROX_BIN", "")
 TIMEOUT = 120
+DAEMONS = ("kovaelasticd", "kovanotifyd", "fileindexd")
 
 CREATE, MODIFY, DELETE, RENAME = 0x40, 0x2, 0x80, 0x100
 
@@ -21,8 +22,8 @@ CREATE, MODIFY, DELETE, RENAME = 0x40, 0x2, 0x80, 0x100
 class Instance:
     """Starts with no daemon; stop() ends what runs and removes the folder."""
 
-    def __init__(self):
-        self.root = tempfile.mkdtemp(prefix="fi-")
+    def __init__(self, root=None):
+        self.root = root or tempfile.mkdtemp(prefix="fi-")
         self.env = dict(os.environ, FERROX_ROOT=self.root, LC_ALL="C.UTF-8")
         self.pids = set()
 
@@ -75,15 +76,15 @@ class Instance:
             return int(file.read())
 
     def note_pids(self):
-        for program in ("kovaelasticd", "kovanotifyd", "fileindexd"):
+        for program in DAEMONS:
             try:
                 self.pids.add(self.pid(program))
             except (OSError, ValueError):
                 pass
 
-    def kill(self, program):
+    def kill(self, program, number=signal.SIGKILL):
         pid = self.pid(program)
-        os.kill(pid, signal.SIGKILL)
+        os.kill(pid, number)
         wait_for(lambda: is_free(f"{self.root}/var/run/{program}.pid"), f"the end of {program}")
 
     def ask(self, daemon, request, end=b""):
@@ -194,6 +195,14 @@ def wait_for(condition, what, seconds=TIMEOUT):
     while not condition():
         assert time.monotonic() < end, f"waited in vain for {what}"
         time.sleep(0.02)
+
+
+def differences(expected, found):
+    """Per path, what should be there and what is, each without what both have."""
+    def without(entry, other):
+        return entry and {field: value for field, value in entry.items() if not other or other.get(field) != value}
+    pairs = {path: (expected.get(path), found.get(path)) for path in expected.keys() | found.keys()}
+    return {path: (without(a, b), without(b, a)) for path, (a, b) in pairs.items() if a != b}
 
 
 def on_disk(folder):

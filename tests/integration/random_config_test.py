@@ -11,7 +11,7 @@ import tempfile
 import time
 import unittest
 
-from instance import CREATE, DELETE, MODIFY, RENAME, Instance, event, wait_for, write
+from instance import CREATE, DELETE, MODIFY, RENAME, Instance, differences, event, wait_for, write
 
 CHECKPOINTS = 3
 CHANGES = 14
@@ -268,14 +268,6 @@ def documents(instance, share):
         if entry["KOVAMDIsDir"]:  # what changes in a folder is told, not that the folder's own size and times change
             entry.update(KOVAMDFSSize=0, _KOVAStamp="")
     return entries
-
-
-def differences(expected, found):
-    """Per path, what should be there and what is, each without what both have."""
-    def without(entry, other):
-        return entry and {field: value for field, value in entry.items() if not other or other.get(field) != value}
-    pairs = {path: (expected.get(path), found.get(path)) for path in expected.keys() | found.keys()}
-    return {path: (without(a, b), without(b, a)) for path, (a, b) in pairs.items() if a != b}
 
 
 class RandomConfigTest(unittest.TestCase):

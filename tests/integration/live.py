@@ -1,0 +1,90 @@
+"""An instance whose notification daemon watches the disk, and what its index must hold, for the tests of the live road."""
+
+import json
+import os
+import stat
+
+from instance import TIMEOUT, Instance, differences, write
+
+WAYS = ("fanotify", "fanotify inode marks", "inotify", "periodic scan")
+FIELDS = ("KOVAMDPath", "KOVAMDIsDir", "KOVAMDFSSize", "KOVAMDFSContentChangeDate", "_KOVAStamp", "KOVAMDTextContent")
+
+
+class LiveInstance(Instance):
+    """Starts with no daemon, too; `shares` are those that are compared, by name."""
+
+    def __init__(self, root=None):
+        super().__init__(root)
+        self.shares = {}
+
+    def watch_by(self, *ways, scan_interval=5):
+        """From the next start of the notification daemon on, only these ways of watching are tried."""
+        write(f"{self.root}/etc/kova/kova.json",
+              json.dumps({"notifyd": {"watch": list(ways), "scan_interval": scan_interval}}))
+
+    def share(self, name, folder=None):
+        """Registers a share, made below the root unless it has a folder elsewhere."""
+        folder = folder or f"{os.path.realpath(self.root)}/vol/{name}"
+        os.makedirs(folder, exist_ok=True)
+        self.ctl("share", "add", folder)
+        self.shares[name] = folder
+        return folder
+
+    def notifyd(self, command="status", **data):
+        reply = self.ask("kovanotifyd", {"type": command, "data": data}, b"\0")
+        assert reply["success"], reply
+        return reply["data"]
+
+    def watches(self):
+        """What the daemon says of each watched folder, by its path."""
+        return {watch["path"]: watch for queue in self.notifyd()["queues"] for watch in queue["watches"]}
+
+    def sync(self):
+        """All changes up to now are in the index when it returns; returns what the daemons say against that."""
+        problems = self.notifyd("sync", timeout_ms=TIMEOUT * 1000)["problems"]
+        reply = self.ask("fileindexd", {"type": "sync", "data": {"shares": list(self.shares),
+                                                                 "timeout_ms": TIMEOUT * 1000}}, b"\0")
+        assert reply["success"], reply
+        return problems + ((reply["data"] or {}).get("problems") or [])
+
+    def indexed(self, share):
+        """Of each document of the share below its folder, by path, what the index says of it."""
+        entries = self.entries(share, self.shares[share], *FIELDS)
+        return {entry["KOVAMDPath"]: facts(entry["KOVAMDIsDir"], entry["KOVAMDFSSize"],
+                                           entry["KOVAMDFSContentChangeDate"], entry["_KOVAStamp"],
+                                           entry.get("KOVAMDTextContent", "")) for entry in entries}
+
+    def differences(self):
+        """Of all shares, per path, what is on the disk and what is in the index, each without what both have."""
+        found = {}
+        for share, folder in self.shares.items():
+            found.update(differences(disk(folder), self.indexed(share)))
+        return found
+
+
+def disk(folder):
+    """Of each file and folder below a folder, by path, what the index must say of it."""
+    found = {}
+    with os.scandir(folder) as entries:
+        for entry in entries:
+            status = entry.stat(follow_symlinks=False)
+            if stat.S_ISLNK(status.st_mode):
+                continue
+            is_folder = stat.S_ISDIR(status.st_mode)
+            stamp = f"{status.st_size}.{status.st_mtime_ns}.{status.st_ctime_ns}.{status.st_ino}"
+            found[entry.path] = facts(is_folder, status.st_size, status.st_mtime_ns // 10**9, stamp,
+                                      "" if is_folder else text(entry.path))
+            if is_folder:
+                found.update(disk(entry.path))
+    return found
+
+
+def facts(is_folder, size, seconds, stamp, content):
+    if is_folder:  # what changes in a folder is told, not that the folder's own size and times change
+        return {"folder": True, "inode": stamp.split(".")[3]}
+    return {"folder": False, "size": size, "mtime": seconds, "stamp": stamp, "text": content}
+
+
+def text(path):
+    with open(path, encoding="utf-8") as file:
+        return file.read()

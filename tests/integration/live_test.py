@@ -1,0 +1,551 @@
+"""Changes on the disk are found by the next fresh search, whatever way of watching there is, and whatever stands in the
+way of the daemons meanwhile."""
+
+import json
+import mmap
+import os
+import shutil
+import signal
+import subprocess
+import sys
+import tempfile
+import threading
+import time
+import unittest
+
+from instance import RENAME, differences, wait_for, write
+from live import WAYS, LiveInstance
+
+NOBODY = 65534
+
+
+def move_tree(old, new):
+    """As a rename, also to another file system."""
+    shutil.move(old, new)
+
+
+class Changes:
+    """What happens to files, a step after the other, each beginning with what those before it have left. `docs` and
+    `media` are shares, `outside` is a folder that nobody watches."""
+
+    def __init__(self, docs, media, outside):
+        self.docs, self.media, self.outside = docs, media, outside
+        self.open_files = []
+
+    @classmethod
+    def steps(cls):
+        return [name for name in vars(cls) if name.startswith("step_")]
+
+    def step_create(self):
+        write(f"{self.docs}/a.txt", "adder")
+        write(f"{self.docs}/sub/deep/b.txt", "bison")
+        os.makedirs(f"{self.media}/empty")
+        write(f"{self.media}/m.txt", "mole")
+
+    def step_write(self):
+        write(f"{self.docs}/a.txt", "antelope instead")
+
+    def step_append_while_open(self):
+        file = open(f"{self.docs}/log.txt", "a", encoding="utf-8")
+        for line in ("first ", "second ", "third "):
+            file.write(line)
+            file.flush()
+        self.open_files.append(file)
+
+    def step_append_more(self):
+        self.open_files[0].write("fourth ")
+        self.open_files[0].flush()
+
+    def step_close(self):
+        self.open_files.pop().close()
+
+    def step_attributes(self):
+        os.chmod(f"{self.docs}/a.txt", 0o640)
+        os.utime(f"{self.docs}/sub/deep/b.txt", (1000000000, 1000000000))
+        os.chmod(f"{self.docs}/sub", 0o750)
+
+    def step_truncate(self):
+        os.truncate(f"{self.docs}/log.txt", 5)
+
+    def step_rename_file(self):
+        os.rename(f"{self.docs}/a.txt", f"{self.docs}/sub/c.txt")
+
+    def step_rename_folder_and_write_below(self):
+        os.rename(f"{self.docs}/sub", f"{self.docs}/under")
+        write(f"{self.docs}/under/deep/b.txt", "buffalo")
+        write(f"{self.docs}/under/deep/new.txt", "newt")
+
+    def step_series_of_renames(self):
+        for number in range(20):
+            os.rename(f"{self.docs}/under" if number == 0 else f"{self.docs}/r{number - 1}", f"{self.docs}/r{number}")
+            write(f"{self.docs}/r{number}/n{number}.txt", f"number{number}")
+        os.rename(f"{self.docs}/r19", f"{self.docs}/under")
+
+    def step_two_change_names(self):
+        write(f"{self.docs}/x/1.txt", "one")
+        write(f"{self.docs}/y/2.txt", "two")
+        os.rename(f"{self.docs}/x", f"{self.docs}/z")
+        os.rename(f"{self.docs}/y", f"{self.docs}/x")
+        os.rename(f"{self.docs}/z", f"{self.docs}/y")
+
+    def step_replace_by_rename(self):
+        write(f"{self.docs}/.new.txt", "saved by an editor")
+        os.rename(f"{self.docs}/.new.txt", f"{self.docs}/under/c.txt")
+
+    def step_move_out(self):
+        os.rename(f"{self.docs}/y", f"{self.outside}/y")
+        os.rename(f"{self.docs}/under/c.txt", f"{self.outside}/c.txt")
+        write(f"{self.outside}/y/later.txt", "changed outside")
+
+    def step_move_in(self):
+        os.rename(f"{self.outside}/y", f"{self.media}/y")
+        os.rename(f"{self.outside}/c.txt", f"{self.docs}/c.txt")
+
+    def step_write_below_what_came_in(self):
+        write(f"{self.media}/y/later.txt", "changed inside")
+        write(f"{self.media}/y/more/x.txt", "and more")
+
+    def step_move_between_shares(self):
+        move_tree(f"{self.media}/y", f"{self.docs}/y")
+        move_tree(f"{self.docs}/under/deep", f"{self.media}/deep")
+        move_tree(f"{self.docs}/c.txt", f"{self.media}/c.txt")
+
+    def step_hard_link(self):
+        os.link(f"{self.media}/c.txt", f"{self.media}/deep/link.txt")
+
+    def step_write_through_the_other_name(self):
+        write(f"{self.media}/c.txt", "seen through both names")
+
+    def step_unlink_one_name(self):
+        os.remove(f"{self.media}/c.txt")
+
+    def step_mmap(self):
+        with open(f"{self.media}/m.txt", "r+b") as file:
+            with mmap.mmap(file.fileno(), 0) as view:
+                view[0:4] = b"MULE"
+
+    def step_folder_created_full(self):
+        for number in range(60):
+            write(f"{self.docs}/full/{number % 5}/{number % 3}/f{number}.txt", f"full{number}")
+
+    def step_folder_with_a_folder_moved_over_an_empty_one(self):
+        os.rename(f"{self.docs}/full/1", f"{self.media}/empty")
+
+    def step_folder_renamed_in_full(self):
+        shutil.copytree(f"{self.docs}/full", f"{self.outside}/full")
+        os.rename(f"{self.outside}/full", f"{self.docs}/again")
+
+    def step_file_becomes_folder_and_back(self):
+        write(f"{self.docs}/turn", "file")
+        os.remove(f"{self.docs}/turn")
+        write(f"{self.docs}/turn/in.txt", "folder")
+        write(f"{self.docs}/turn2/in.txt", "folder")
+        shutil.rmtree(f"{self.docs}/turn2")
+        write(f"{self.docs}/turn2", "file")
+
+    def step_symlinks(self):
+        os.symlink("/etc", f"{self.docs}/link")
+        os.symlink(f"{self.docs}/full", f"{self.docs}/full2")
+        os.rename(f"{self.docs}/turn2", f"{self.docs}/turn3")
+        os.symlink("turn3", f"{self.docs}/turn2")
+
+    def step_odd_names(self):
+        folder = os.fsencode(self.docs) + b"/new\nline \xff\xfe"
+        for name in (b"a\nb.txt", b"\xc3\x28.txt", b'quo"te\\.txt', b" ", b"x" * 255, b"\x01.txt"):
+            write(folder + b"/" + name, "needle")
+        os.rename(folder, folder + b"\n")
+
+    def step_short_lived(self):
+        for number in range(50):
+            write(f"{self.docs}/tmp{number}.txt", "gone soon")
+            os.remove(f"{self.docs}/tmp{number}.txt")
+
+    def step_delete(self):
+        os.remove(f"{self.docs}/log.txt")
+        shutil.rmtree(f"{self.docs}/full")
+        os.rmdir(f"{self.media}/y") if os.path.isdir(f"{self.media}/y") else None
+
+
+class LiveTest(unittest.TestCase):
+    maxDiff = 4000
+
+    def setUp(self):
+        self.instance = self.make()
+
+    def make(self, root=None):
+        instance = LiveInstance(root)
+        self.addCleanup(self.stop, instance)
+        return instance
+
+    def stop(self, instance):
+        self.assertEqual([], instance.stop(), "processes that 'down' left running")
+
+    def up(self, *shares):
+        """The folders of the shares, which are watched."""
+        self.instance.ctl("up")
+        folders = [self.instance.share(name) for name in shares]
+        self.expect_index_is_disk()
+        return folders
+
+    def expect_index_is_disk(self):
+        problems = self.instance.sync()
+        found = self.instance.differences()
+        self.assertEqual({}, found, f"what is on the disk, and what is in the index; the daemons say: {problems}")
+
+    # Ways of watching.
+
+    def use_way(self, way):
+        """The folders docs, media (each a share) and outside; skips where the machine does not permit the way."""
+        self.instance.watch_by(way, scan_interval=3600)
+        docs, media = self.up("docs", "media")
+        watch = self.instance.watches()[docs]
+        if watch["watch"] != way:
+            self.skipTest(f"{way}: {watch['reason']}")
+        outside = f"{self.instance.root}/vol/outside"
+        os.makedirs(outside)
+        return docs, media, outside
+
+    def check_way(self, way):
+        changes = Changes(*self.use_way(way))
+        for step in Changes.steps():
+            with self.subTest(step=step):
+                getattr(changes, step)()
+                self.expect_index_is_disk()
+        self.assertEqual([f"{changes.docs}/turn/in.txt"], [os.fsdecode(path) for path in
+                         self.instance.search("--fresh", "folder", "path:" + changes.docs)])
+        self.assertEqual(0, self.instance.notifyd()["lost"])
+
+    def test_changes_by_fanotify(self):
+        self.check_way("fanotify")
+
+    def test_changes_by_inode_marks(self):
+        self.check_way("fanotify inode marks")
+
+    def test_changes_by_inotify(self):
+        self.check_way("inotify")
+
+    def test_changes_by_periodic_scan(self):
+        self.check_way("periodic scan")
+
+    def test_changes_seen_by_an_ordinary_user(self):
+        if os.geteuid() != 0:
+            self.skipTest("the other cases are those of an ordinary user")
+        cases = ["LiveTest.test_changes_by_inode_marks", "LiveTest.test_changes_by_inotify",
+                 "LiveTest.test_changes_by_periodic_scan", "LiveTest.test_default_way_is_the_best_there_is"]
+        with tempfile.TemporaryDirectory() as folder:  # the programs, where such a user can reach them
+            os.chmod(folder, 0o755)
+            programs = os.environ["FERROX_BIN"]
+            for program in ("fileindexctl", "kovaelasticd", "kovanotifyd", "fileindexd"):
+                shutil.copy(f"{programs}/{program}", folder)
+            for script in ("instance.py", "live.py", "live_test.py"):
+                shutil.copy(os.path.join(os.path.dirname(os.path.abspath(__file__)), script), folder)
+            done = subprocess.run([sys.executable, "-B", f"{folder}/live_test.py", *cases], user=NOBODY, group=NOBODY,
+                                  extra_groups=[], env=dict(os.environ, FERROX_BIN=folder), cwd="/", timeout=200,
+                                  capture_output=True, check=False)
+        self.assertEqual(0, done.returncode, done.stderr.decode(errors="replace"))
+
+    def test_default_way_is_the_best_there_is(self):
+        docs, = self.up("docs")
+        watch = self.instance.watches()[docs]
+        self.assertIn(watch["watch"], WAYS[:3], watch)
+        self.assertTrue(watch["covered"])
+        if os.geteuid() != 0:
+            self.assertNotEqual("fanotify", watch["watch"])
+            self.assertTrue(watch["reason"])
+
+    # What is written into the queue.
+
+    def test_renamed_folder_is_one_line(self):
+        docs, = self.up("docs")
+        for number in range(200):
+            write(f"{docs}/old/{number % 7}/{number}.txt", f"word{number}")
+        self.expect_index_is_disk()
+        self.instance.kill("fileindexd", signal.SIGTERM)
+        os.rename(f"{docs}/old", f"{docs}/new")
+        self.instance.notifyd("sync", timeout_ms=10000)
+        with open(self.instance.queue_path(docs), encoding="utf-8") as file:
+            lines = [json.loads(line) for line in file]
+        self.assertEqual([(RENAME, True, f"{docs}/new", f"{docs}/old")],
+                         [(line["event"], line["is_dir"], line["path"], line["path_old"]) for line in lines])
+        self.instance.ctl("up")
+        self.expect_index_is_disk()
+
+    def test_written_file_is_one_line(self):
+        docs, = self.up("docs")
+        self.instance.kill("fileindexd", signal.SIGTERM)
+        with open(f"{docs}/big.txt", "wb", buffering=0) as file:
+            for number in range(2000):
+                file.write(b"word%d " % number)
+        self.instance.notifyd("sync", timeout_ms=10000)
+        with open(self.instance.queue_path(docs), encoding="utf-8") as file:
+            lines = file.readlines()
+        self.assertLessEqual(len(lines), 2, lines)
+        self.instance.ctl("up")
+        self.expect_index_is_disk()
+
+    def test_idle_instance_does_nothing(self):
+        docs, = self.up("docs")
+        write(f"{docs}/a.txt", "word")
+        self.expect_index_is_disk()
+        wait_for(lambda: not os.path.exists(self.instance.queue_path(docs) + ".tmp"), "the queue to be gone")
+
+        def figures():
+            files = {path: os.lstat(path)[6:9] for path in walk(self.instance.root) if not path.startswith(docs)}
+            return files, [queue["written"] for queue in self.instance.notifyd()["queues"]]
+        before = figures()
+        switches = {program: context_switches(self.instance.pid(program)) for program in ("kovanotifyd", "fileindexd")}
+        time.sleep(3)
+        for program, count in switches.items():
+            woken = context_switches(self.instance.pid(program)) - count
+            self.assertLessEqual(woken, 12, f"{program} was woken so often in 3 s")
+        self.assertEqual(before, figures())
+
+    # What happens while nobody looks.
+
+    def test_registrations_come_and_go_while_others_change(self):
+        docs, = self.up("docs")
+        end = threading.Event()
+
+        def change():
+            for number in range(100000):
+                if end.is_set():
+                    return
+                write(f"{docs}/{number % 10}/{number % 100}.txt", f"word{number}")
+                if number % 50 == 0:
+                    shutil.rmtree(f"{docs}/{number // 50 % 10}", ignore_errors=True)
+                time.sleep(0.002)
+        thread = threading.Thread(target=change)
+        thread.start()
+        try:
+            for number in range(4):
+                media = self.instance.share("media")
+                write(f"{media}/{number}/x.txt", f"media{number}")
+                self.assertLess(time_until(lambda: media in self.instance.watches()), 1.5)
+                if number < 3:
+                    self.instance.ctl("share", "remove", "media")
+                    del self.instance.shares["media"]
+                    self.assertLess(time_until(lambda: media not in self.instance.watches()), 1.5)
+        finally:
+            end.set()
+            thread.join()
+        self.expect_index_is_disk()
+
+    def test_restarted_and_killed_daemon_finds_what_it_missed(self):
+        docs, media = self.up("docs", "media")
+        for number, end in enumerate((signal.SIGTERM, signal.SIGKILL, signal.SIGKILL)):
+            write(f"{docs}/before{number}.txt", f"before{number}")
+            self.instance.kill("kovanotifyd", end)
+            write(f"{docs}/down{number}/a.txt", f"down{number}")
+            os.rename(f"{docs}/before{number}.txt", f"{media}/moved{number}.txt")
+            if number > 0:
+                shutil.rmtree(f"{docs}/down{number - 1}")
+            self.instance.ctl("up")
+            write(f"{docs}/down{number}/b.txt", f"up{number}")
+            self.expect_index_is_disk()
+        for program in ("fileindexd", "kovaelasticd"):
+            write(f"{docs}/{program}.txt", "while it is there")
+            self.instance.kill(program)
+            write(f"{docs}/{program}.txt", "while it is not")
+            self.instance.ctl("up")
+            self.expect_index_is_disk()
+
+    def overflow(self, way):
+        docs, media, outside = self.use_way(way)
+        for number in range(100):
+            write(f"{docs}/{number % 10}/{number}.txt", f"word{number}")
+        self.expect_index_is_disk()
+        reader = self.instance.pid("kovanotifyd")
+        os.kill(reader, signal.SIGSTOP)
+        try:
+            for number in range(3):
+                os.rename(f"{docs}/{number}", f"{docs}/before{number}")
+            for number in range(6000):
+                write(f"{docs}/churn{number % 7}.txt", "x")
+                os.remove(f"{docs}/churn{number % 7}.txt")
+            for number in range(3, 6):
+                os.rename(f"{docs}/{number}", f"{(docs, media, outside)[number - 3]}/after{number}")
+            for number in range(50):
+                write(f"{docs}/new{number % 4}/{number}.txt", f"new{number}")
+            shutil.rmtree(f"{docs}/6")
+        finally:
+            os.kill(reader, signal.SIGCONT)
+        self.expect_index_is_disk()
+        write(f"{docs}/new1/behind it.txt", "watched again")
+        os.rename(f"{docs}/before1", f"{docs}/behind it")
+        self.expect_index_is_disk()
+
+    def test_overflow_of_fanotify(self):
+        self.overflow("fanotify")
+
+    def test_overflow_of_inode_marks(self):
+        self.overflow("fanotify inode marks")
+
+    def test_overflow_of_inotify(self):
+        self.overflow("inotify")
+
+    # Volumes and folders.
+
+    def mount(self, *words):
+        done = subprocess.run(["mount", *words], capture_output=True, text=True, check=False)
+        if done.returncode != 0:
+            self.skipTest(f"mount: {done.stderr.strip()}")
+        self.addCleanup(subprocess.run, ["umount", "-l", words[-1]], capture_output=True, check=False)
+
+    def scratch(self):
+        folder = os.path.realpath(tempfile.mkdtemp(prefix="fi-"))
+        self.addCleanup(shutil.rmtree, folder, ignore_errors=True)
+        return folder
+
+    def test_full_disk_holds_changes_until_there_is_space(self):
+        state, files = self.scratch(), self.scratch()
+        self.mount("-t", "tmpfs", "-o", "size=24m", "none", state)
+        self.instance = self.make(state)
+        self.instance.ctl("up")
+        docs = self.instance.share("docs", f"{files}/docs")
+        self.expect_index_is_disk()
+        self.instance.kill("fileindexd", signal.SIGTERM)
+        with open(f"{state}/filler", "wb", buffering=0) as file:
+            with self.assertRaises(OSError):
+                while True:
+                    file.write(bytes(4096))
+        for number in range(300):
+            write(f"{docs}/{number % 9}/{number}.txt", f"word{number}")
+        os.rename(f"{docs}/1", f"{docs}/one")
+        queue = self.instance.notifyd()["queues"][0]
+        wait_for(lambda: self.instance.notifyd()["queues"][0]["held"] > 0, "changes to be held", seconds=10)
+        queue = self.instance.notifyd()["queues"][0]
+        self.assertTrue(queue["held_reason"], queue)
+        self.assertLess(abs(queue["held_since"] - time.time()), 60, queue)
+        os.remove(f"{state}/filler")
+        self.instance.ctl("up")
+        self.expect_index_is_disk()
+        self.assertEqual(0, self.instance.notifyd()["queues"][0]["held"])
+
+    def test_unmounted_volume_is_no_deletion(self):
+        volume, elsewhere = self.scratch(), self.scratch()
+        self.mount("-t", "tmpfs", "none", elsewhere)
+        for share in ("whole", "volume/part"):
+            os.makedirs(f"{elsewhere}/{share}")
+            os.makedirs(f"{volume}/{os.path.dirname(share) or share}", exist_ok=True)
+        mounts = [(f"{elsewhere}/whole", f"{volume}/whole"), (f"{elsewhere}/volume", f"{volume}/volume")]
+        for old, new in mounts:
+            self.mount("--bind", old, new)
+        self.instance.ctl("up")
+        whole = self.instance.share("whole", f"{volume}/whole")
+        part = self.instance.share("part", f"{volume}/volume/part")
+        for folder in (whole, part):
+            for number in range(20):
+                write(f"{folder}/{number % 3}/{number}.txt", f"word{number}")
+        self.expect_index_is_disk()
+        before = {share: self.instance.indexed(share) for share in self.instance.shares}
+        for round_number in range(2):
+            for _, new in mounts:
+                subprocess.run(["umount", new], check=True)
+            if round_number == 1:
+                self.instance.kill("kovanotifyd")
+                self.instance.kill("fileindexd")
+                self.instance.ctl("up")
+            self.instance.notifyd("sync", timeout_ms=10000)
+            time.sleep(0.5)
+            for share, documents in before.items():
+                self.assertEqual({}, differences(documents, self.instance.indexed(share)), share)
+            write(f"{elsewhere}/whole/1/changed.txt", f"meanwhile{round_number}")
+            write(f"{elsewhere}/volume/part/1/changed.txt", f"meanwhile{round_number}")
+            os.rename(f"{elsewhere}/volume/part/2", f"{elsewhere}/volume/part/two{round_number}")
+            os.makedirs(f"{elsewhere}/volume/part/2")
+            for old, new in mounts:
+                subprocess.run(["mount", "--bind", old, new], check=True)
+            wait_for(lambda: self.instance.watches().get(part, {}).get("covered"), "the volume to be watched", 10)
+            wait_for(lambda: self.instance.watches().get(whole, {}).get("covered"), "the volume to be watched", 10)
+            self.expect_index_is_disk()
+            write(f"{whole}/2/behind it.txt", "watched again")
+            write(f"{part}/2/behind it.txt", "watched again")
+            self.expect_index_is_disk()
+            before = {share: self.instance.indexed(share) for share in self.instance.shares}
+
+    def test_folder_of_a_share_goes_and_comes_back(self):
+        docs, = self.up("docs")
+        write(f"{docs}/sub/a.txt", "word")
+        self.expect_index_is_disk()
+        for come_back in (lambda: os.rename(f"{docs}.away", docs),
+                          lambda: shutil.copytree(f"{docs}.away", docs)):
+            os.rename(docs, f"{docs}.away")
+            self.instance.notifyd("sync", timeout_ms=10000)
+            os.symlink(f"{docs}.away", docs)
+            write(f"{docs}.away/sub/meanwhile.txt", f"{time.time()}")
+            self.instance.notifyd("sync", timeout_ms=10000)
+            os.remove(docs)
+            come_back()
+            wait_for(lambda: self.instance.watches().get(docs, {}).get("covered"), "the folder to be watched", 10)
+            self.expect_index_is_disk()
+            write(f"{docs}/sub/behind it.txt", f"watched again, {time.time()}")
+            self.expect_index_is_disk()
+
+    def test_indexed_folder_in_a_share_goes_and_comes_back(self):
+        self.instance.ctl("up")
+        docs = self.instance.add_share("docs", "--no-index")
+        sub = f"{docs}/a/sub"
+        write(f"{sub}/f.txt", "word")
+        self.instance.ctl("folder", "add", "/docs/a/sub")
+        self.instance.shares = {"docs": sub}
+        self.expect_index_is_disk()
+        os.rename(f"{docs}/a", f"{docs}/b")
+        self.instance.sync()
+        write(f"{docs}/b/sub/g.txt", "while it is not indexed")
+        os.rename(f"{docs}/b", f"{docs}/a")
+        self.expect_index_is_disk()
+        write(f"{sub}/h.txt", "watched again")
+        self.expect_index_is_disk()
+        shutil.rmtree(f"{docs}/a")
+        self.instance.sync()
+        self.assertEqual({}, self.instance.indexed("docs"))
+        write(f"{sub}/new.txt", "made anew")
+        self.expect_index_is_disk()
+        write(f"{sub}/newer.txt", "and watched")
+        self.expect_index_is_disk()
+
+    def test_wrong_registrations_do_not_disturb_others(self):
+        docs, = self.up("docs")
+        registry = f"{self.instance.root}/var/lib/kova/notifyd/queues"
+        os.makedirs(f"{registry}/folder.json")
+        queue = f"{self.instance.root}/stale.queue"
+        stale = {"application": "test", "type": 1, "queue": queue, "config": [
+            {"path": f"{self.instance.root}/never there", "mask": 65478, "ignore": []}]}
+        good = ("/test/1" + queue).replace("+", "%2B").strip("/").replace("/", "+") + ".json"
+        for name, content in {"broken.json": "{", "empty.json": "", "huge.json": "[" * 3000000, "list.json": "[1,2]",
+                              "other+1+name.json": json.dumps(stale), "half.json": json.dumps(stale)[:60],
+                              "\udcff.json": "\0\0", good: json.dumps(stale)}.items():
+            write(f"{registry}/.beside", content)
+            os.rename(f"{registry}/.beside", f"{registry}/{name}")
+            write(f"{docs}/{len(name)}.txt", f"beside {len(content)}")
+            self.expect_index_is_disk()
+        os.symlink("/dev/zero", f"{registry}/zero.json")
+        self.instance.kill("kovanotifyd")
+        write(f"{docs}/down.txt", "while it was down")
+        self.instance.ctl("up")
+        self.expect_index_is_disk()
+        self.assertTrue(self.instance.notifyd()["problems"])
+        self.assertFalse(os.path.exists(queue), "there is nothing to tell")
+
+
+def walk(folder):
+    return [os.path.join(parent, name) for parent, folders, files in os.walk(folder) for name in folders + files]
+
+
+def context_switches(pid):
+    """Of all threads of a process, how often they were woken or interrupted."""
+    count = 0
+    for task in os.listdir(f"/proc/{pid}/task"):
+        with open(f"/proc/{pid}/task/{task}/status", encoding="ascii") as file:
+            count += sum(int(line.split()[1]) for line in file if "ctxt_switches" in line)
+    return count
+
+
+def time_until(condition):
+    begin = time.monotonic()
+    wait_for(condition, "what was to come", 20)
+    return time.monotonic() - begin
+
+
+if __name__ == "__main__":
+    unittest.main()
