@@ -87,9 +87,9 @@ class Instance:
         os.kill(pid, number)
         wait_for(lambda: is_free(f"{self.root}/var/run/{program}.pid"), f"the end of {program}")
 
-    def ask(self, daemon, request, end=b""):
+    def ask(self, daemon, request, end=b"", seconds=TIMEOUT):
         with socket.socket(socket.AF_UNIX) as connection:
-            connection.settimeout(TIMEOUT)
+            connection.settimeout(seconds)
             connection.connect(f"{self.root}/var/run/{daemon}.sock")
             body = to_bytes(request) + end
             connection.sendall(struct.pack("=I", len(body)) + body)

@@ -15,7 +15,7 @@ class LiveInstance(Instance):
 
     def __init__(self, root=None):
         super().__init__(root)
-        self.shares = {}
+        self.shares, self.sync_seconds = {}, TIMEOUT
 
     def watch_by(self, *ways, scan_interval=5):
         """From the next start of the notification daemon on, only these ways of watching are tried."""
@@ -31,7 +31,7 @@ class LiveInstance(Instance):
         return folder
 
     def notifyd(self, command="status", **data):
-        reply = self.ask("kovanotifyd", {"type": command, "data": data}, b"\0")
+        reply = self.ask("kovanotifyd", {"type": command, "data": data}, b"\0", self.sync_seconds)
         assert reply["success"], reply
         return reply["data"]
 
@@ -41,11 +41,11 @@ class LiveInstance(Instance):
 
     def sync(self):
         """All changes up to now are in the index when it returns; returns what the daemons say against that."""
-        problems = self.notifyd("sync", timeout_ms=TIMEOUT * 1000)["problems"]
-        reply = self.ask("fileindexd", {"type": "sync", "data": {"shares": list(self.shares),
-                                                                 "timeout_ms": TIMEOUT * 1000}}, b"\0")
-        assert reply["success"], reply
-        return problems + ((reply["data"] or {}).get("problems") or [])
+        problems = self.notifyd("sync", timeout_ms=self.sync_seconds * 1000)["problems"]
+        data = {"shares": list(self.shares), "timeout_ms": self.sync_seconds * 1000}
+        reply = self.ask("fileindexd", {"type": "sync", "data": data}, b"\0", self.sync_seconds)
+        assert reply["success"], (reply, problems)
+        return problems
 
     def indexed(self, share):
         """Of each document of the share below its folder, by path, what the index says of it."""
