@@ -95,7 +95,7 @@ Notifier::TimePoint Notifier::NextDue() const {
 void Notifier::Wait(int stop_fd) {
   std::vector<pollfd> polled = {{stop_fd, POLLIN, 0}, {wake_.Get(), POLLIN, 0}, {registry_watch_.Fd(), POLLIN, 0}};
   const size_t disturbances = polled.size();
-  for (const int fd : watches_.DisturbanceFds()) polled.push_back({fd, POLLIN | POLLPRI, 0});
+  for (const pollfd& disturbance : watches_.Disturbances()) polled.push_back(disturbance);
   const size_t changes = polled.size();
   // While a batch gathers, or is known to be there, its descriptors would only end the wait.
   const bool is_gathering = read_at_ != TimePoint::max() && !syncs_.IsRunning();

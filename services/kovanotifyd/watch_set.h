@@ -1,5 +1,7 @@
 #pragma once
 
+#include <poll.h>
+
 #include <chrono>
 #include <cstdint>
 #include <map>
@@ -64,8 +66,8 @@ class WatchSet {
   void Examine();
   /// Whether something happened that calls for Examine.
   bool IsDisturbed() const { return disturbed_; }
-  /// To be polled for POLLIN and POLLPRI, calling for Examine; -1: none.
-  std::vector<int> DisturbanceFds() const { return {guard_.Fd(), mounts_.Fd()}; }
+  /// To be polled, calling for Examine. The mount table is always readable: only POLLPRI tells of a change.
+  std::vector<pollfd> Disturbances() const { return {{guard_.Fd(), POLLIN, 0}, {mounts_.Fd(), POLLPRI, 0}}; }
 
   size_t Ways() const { return ways_.size(); }
   const std::string& NameOf(size_t way) const { return ways_[way].name; }
