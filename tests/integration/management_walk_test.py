@@ -169,7 +169,7 @@ class ManagementWalkTest(InstanceTestCase):
         self.assertIsNone(self.instance.status()["index_daemon"])
         self.assertEqual({}, self.indices())
         self.assertEqual([], self.files_below("var/lib/kova/fileindex"))
-        self.assertEqual([], self.files_below("var/lib/kova/notifyd"))
+        self.assertEqual([], self.files_below("var/lib/kova/notifyd/queues"))
         with open(f"{self.instance.root}/var/packages/Ferrox/etc/fileindex.status", encoding="utf-8") as file:
             self.assertFalse(json.load(file).get("share"))
         self.assertEqual([], self.instance.search("zeppelin"))
