@@ -62,6 +62,7 @@ Notifier::Notifier(Options options)
 Notifier::~Notifier() { Close(); }
 
 void Notifier::Run(int stop_fd) {
+  ReadRegistry();
   while (!is_stopping_) Step(stop_fd);
   Close();
   for (size_t way = 0; way < watches_.Ways(); ++way) (void)watches_.Read(way);

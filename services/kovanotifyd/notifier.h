@@ -106,7 +106,7 @@ class Notifier : private WatchSet::Listener {
 
   bool is_stopping_ = false;
   bool has_work_ = true;  ///< a watcher has something to go on with
-  bool registry_changed_ = true;
+  bool registry_changed_ = false;
   bool disturbed_ = false;
   TimePoint read_at_;
   TimePoint flush_at_;
