@@ -2,10 +2,36 @@
 
 #include <fcntl.h>
 
+#include <algorithm>
 #include <fstream>
+#include <iterator>
 #include <sstream>
 
+#include "services/kovanotifyd/watch_roots.h"
+
 namespace ferrox::notifyd {
+
+namespace {
+
+/// File systems that ask another machine for everything.
+constexpr const char* kNetworkTypes[] = {"nfs",  "nfs4", "cifs",   "smb3",       "ceph",          "afs",
+                                         "coda", "9p",   "lustre", "fuse.sshfs", "fuse.glusterfs"};
+
+/// Blanks, tabs, newlines and backslashes stand as "\040" and so on.
+std::string Unescape(const std::string& text) {
+  std::string plain;
+  for (size_t i = 0; i < text.size(); ++i) {
+    if (text[i] == '\\' && i + 3 < text.size()) {
+      plain += static_cast<char>((text[i + 1] - '0') * 64 + (text[i + 2] - '0') * 8 + (text[i + 3] - '0'));
+      i += 3;
+    } else {
+      plain += text[i];
+    }
+  }
+  return plain;
+}
+
+}  // namespace
 
 MountTable::MountTable(const char* path) : path_(path), fd_(open(path, O_RDONLY | O_CLOEXEC)) { Read(); }
 
@@ -20,6 +46,12 @@ void MountTable::Read() {
     std::string device, root, point;
     if (!(fields >> id >> line.parent >> device >> root >> point)) continue;
     line.entry = device + " " + root + " " + point;
+    line.point = Unescape(point);
+    std::string type;
+    const size_t separator = text.find(" - ");
+    if (separator != std::string::npos)
+      type = text.substr(separator + 3, text.find(' ', separator + 3) - separator - 3);
+    line.is_network = std::find(std::begin(kNetworkTypes), std::end(kNetworkTypes), type) != std::end(kNetworkTypes);
     lines_[id] = std::move(line);
   }
 }
@@ -41,6 +73,16 @@ Mount MountTable::Find(uint64_t id) const {
 bool MountTable::IsMounted(const Mount& mount) const {
   const auto line = lines_.find(mount.id);
   return line != lines_.end() && line->second.entry == mount.entry;
+}
+
+uint64_t MountTable::NetworkMountOf(const std::string& path) const {
+  const auto nearest = std::max_element(lines_.begin(), lines_.end(), [&path](const auto& a, const auto& b) {
+    const auto depth = [&path](const std::string& point) { return IsAtOrBelow(path, point) ? point.size() : 0; };
+    return depth(a.second.point) < depth(b.second.point);
+  });
+  const bool is_network =
+      nearest != lines_.end() && nearest->second.is_network && IsAtOrBelow(path, nearest->second.point);
+  return is_network ? nearest->first : 0;
 }
 
 }  // namespace ferrox::notifyd

@@ -28,11 +28,16 @@ class MountTable {
   /// Without an entry when there is none of that id.
   Mount Find(uint64_t id) const;
   bool IsMounted(const Mount& mount) const;
+  /// The id of the mount that a path is on when its server may be away, so that a look at it may not come back; else 0.
+  /// The path itself is not looked at.
+  uint64_t NetworkMountOf(const std::string& path) const;
 
  private:
   struct Line {
     uint64_t parent = 0;
     std::string entry;
+    std::string point;
+    bool is_network = false;
   };
 
   std::string path_;

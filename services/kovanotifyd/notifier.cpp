@@ -235,15 +235,17 @@ NotifierStatus Notifier::MakeStatus() const {
 }
 
 std::vector<std::string> Notifier::Sync(std::chrono::milliseconds timeout) {
-  auto promise = std::make_shared<std::promise<SyncRounds::Problems>>();
-  std::future<SyncRounds::Problems> future = promise->get_future();
+  auto promise = std::make_shared<std::promise<SyncRounds::Outcome>>();
+  std::future<SyncRounds::Outcome> future = promise->get_future();
   const TimePoint deadline = SteadyClock::now() + timeout;
   Post([this, promise, deadline] {
     syncs_.Add(std::move(*promise), deadline);
     expire_at_ = std::min(expire_at_, deadline);
   });
   promise.reset();
-  return Await(std::move(future), timeout + kStatusTimeout, "the notification daemon is busy");
+  SyncRounds::Outcome outcome = Await(std::move(future), timeout + kStatusTimeout, "the notification daemon is busy");
+  if (!outcome.failure.empty()) throw Error(Error::kInternal, outcome.failure);
+  return std::move(outcome.problems);
 }
 
 NotifierStatus Notifier::Status() {

@@ -3,8 +3,6 @@
 #include <algorithm>
 #include <utility>
 
-#include "common/error.h"
-
 namespace ferrox::notifyd {
 
 SyncRounds::TimePoint SyncRounds::Expire(TimePoint now, const std::string& sentence) {
@@ -12,7 +10,7 @@ SyncRounds::TimePoint SyncRounds::Expire(TimePoint now, const std::string& sente
   for (std::vector<Request>* requests : {&current_, &next_}) {
     for (auto it = requests->begin(); it != requests->end();) {
       if (it->deadline <= now) {
-        it->promise.set_exception(std::make_exception_ptr(Error(Error::kInternal, sentence)));
+        it->promise.set_value({{}, sentence});
         it = requests->erase(it);
       } else {
         next = std::min(next, it->deadline);
@@ -47,7 +45,7 @@ void SyncRounds::Drained(size_t way) {
 
 void SyncRounds::End(const Problems& problems) {
   is_running_ = false;
-  for (Request& request : std::exchange(current_, {})) request.promise.set_value(problems);
+  for (Request& request : std::exchange(current_, {})) request.promise.set_value({problems});
 }
 
 }  // namespace ferrox::notifyd

@@ -14,10 +14,14 @@ class SyncRounds {
  public:
   using TimePoint = std::chrono::steady_clock::time_point;
   using Problems = std::vector<std::string>;
+  struct Outcome {
+    Problems problems = {};
+    std::string failure = {};  ///< a sentence, of what was not reached in time
+  };
 
   explicit SyncRounds(size_t ways) : cookies_(ways, Cookie::kIdle) {}
 
-  void Add(std::promise<Problems> request, TimePoint deadline) { next_.push_back({std::move(request), deadline}); }
+  void Add(std::promise<Outcome> request, TimePoint deadline) { next_.push_back({std::move(request), deadline}); }
   /// Fails the requests whose time is over. Returns when the next one's is, or TimePoint::max().
   TimePoint Expire(TimePoint now, const std::string& sentence);
 
@@ -39,7 +43,7 @@ class SyncRounds {
  private:
   enum class Cookie { kIdle, kOutstanding, kUncertain };
   struct Request {
-    std::promise<Problems> promise;
+    std::promise<Outcome> promise;
     TimePoint deadline;
   };
 

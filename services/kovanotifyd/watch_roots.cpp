@@ -35,7 +35,8 @@ bool HasComponentOf(const std::string& path, size_t from, const Names& names) {
 }  // namespace
 
 bool IsAtOrBelow(const std::string& path, const std::string& folder) {
-  return path.compare(0, folder.size(), folder) == 0 && (path.size() == folder.size() || path[folder.size()] == '/');
+  return path.compare(0, folder.size(), folder) == 0 &&
+         (path.size() == folder.size() || folder.back() == '/' || path[folder.size()] == '/');
 }
 
 bool Covers(const WatchRoot& outer, const WatchRoot& inner) {

@@ -21,14 +21,6 @@ constexpr char kRemote[] = "changes that are made elsewhere on a remote file sys
 constexpr std::chrono::minutes kRetryInterval{10};
 constexpr int kReadsMax = 64;
 
-bool IsRemote(const std::string& path) { return KOVAFSIsRemoteFS(KOVAGetFSType(path.c_str(), 0)) == 1; }
-
-bool IsOnOneMount(const std::string& outer, const std::string& inner) {
-  const FolderLook above = LookAtFolder(outer);
-  const FolderLook below = LookAtFolder(inner);
-  return above.problem.empty() && below.problem.empty() && below.identity.IsOnMountOf(above.identity);
-}
-
 /// The watches, each with its queue, that are in the first and not in the second.
 std::vector<QueueWatch> Added(const std::vector<Registration>& now, const std::vector<Registration>& before) {
   std::set<std::tuple<std::string, std::string, uint32_t, std::vector<std::string>>> known;
@@ -125,8 +117,22 @@ void WatchSet::Examine() {
   disturbed_ = false;
   mounts_.Read();
   const std::set<std::string> disturbed = guard_.Read();
-  ChangeRoots(WatchRoots(registrations_, IsOnOneMount));
+  const auto is_on_one_mount = [this](const std::string& outer, const std::string& inner) {
+    const FolderLook above = Look(outer);
+    const FolderLook below = Look(inner);
+    return above.problem.empty() && below.problem.empty() && below.identity.IsOnMountOf(above.identity);
+  };
+  ChangeRoots(WatchRoots(registrations_, is_on_one_mount));
   for (auto& [path, root] : roots_) ExamineRoot(root, disturbed.count(path) != 0);
+}
+
+/// A folder whose server may not answer is taken for what it is said to be.
+FolderLook WatchSet::Look(const std::string& path) const {
+  FolderLook look;
+  look.identity.mount = mounts_.NetworkMountOf(path);
+  if (look.identity.mount == 0) return LookAtFolder(path);
+  look.result = FolderLook::Result::kUsable;
+  return look;
 }
 
 void WatchSet::ChangeRoots(const std::vector<WatchRoot>& roots) {
@@ -144,7 +150,7 @@ void WatchSet::ChangeRoots(const std::vector<WatchRoot>& roots) {
 }
 
 void WatchSet::ExamineRoot(Root& root, bool is_disturbed) {
-  const FolderLook look = LookAtFolder(root.watch.path);
+  const FolderLook look = Look(root.watch.path);
   const bool was_watched = root.state != Root::State::kWaiting;
   if (look.result != FolderLook::Result::kUsable) {
     Stop(root);
@@ -174,7 +180,7 @@ void WatchSet::Begin(Root& root, const FolderLook& look) {
   root.mount = mounts_.Find(look.identity.mount);
   root.way = 0;
   root.reason.clear();
-  guard_.Add(root.watch.path);
+  if (mounts_.NetworkMountOf(root.watch.path) == 0) guard_.Add(root.watch.path);
   TryNext(root);
 }
 
@@ -186,7 +192,8 @@ void WatchSet::Stop(Root& root) {
 }
 
 void WatchSet::TryNext(Root& root) {
-  const bool is_remote = IsRemote(root.watch.path);
+  const std::string& path = root.watch.path;
+  const bool is_remote = mounts_.NetworkMountOf(path) != 0 || KOVAFSIsRemoteFS(KOVAGetFSType(path.c_str(), 0)) == 1;
   for (; root.way < ways_.size(); ++root.way) {
     const Way& way = ways_[root.way];
     if (way.watcher != nullptr && !is_remote) {

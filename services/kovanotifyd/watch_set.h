@@ -95,6 +95,7 @@ class WatchSet {
   class Ear;
   using Roots = std::map<std::string, Root>;
 
+  FolderLook Look(const std::string& path) const;
   void ChangeRoots(const std::vector<WatchRoot>& roots);
   void ExamineRoot(Root& root, bool is_disturbed);
   void Begin(Root& root, const FolderLook& look);

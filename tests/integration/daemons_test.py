@@ -10,18 +10,16 @@ from instance import CREATE, MODIFY, RENAME, InstanceTestCase, event, on_disk, t
 
 class DaemonsTest(InstanceTestCase):
     def up_with_share(self, files=0):
-        """The folder of the share docs, which is indexed; it has so many files that are not yet told of."""
+        """The folder of the share docs, which is being indexed, with so many files."""
         self.ctl("up")
-        folder = self.instance.add_share("docs")
-        if files:
-            self.instance.wait_idle("docs", folder)
+        folder = self.instance.add_share("docs", "--no-index")
         for i in range(files):
             write(f"{folder}/d{i % 50}/file{i}.txt", f"number{i} " + "some words to read " * 50)
+        self.ctl("folder", "add", "/docs")
         return folder
 
     def up_in_the_middle_of_indexing(self):
         folder = self.up_with_share(4000)
-        self.ctl("index", "docs")
         wait_for(lambda: self.docs()["written"] > 100, "indexing to begin")
         return folder
 

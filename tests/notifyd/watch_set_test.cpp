@@ -227,6 +227,23 @@ TEST(WatchRootsTest, AreFewAndIgnoreOnlyWhatAllIgnore) {
   }
 }
 
+TEST(MountTableTest, TellsWhatLiesOnWhatAndWhatIsBehindANetwork) {
+  const test::TempDir dir;
+  test::WriteFile(dir / "mounts",
+                  "20 1 8:1 / / rw - ext4 /dev/a rw\n"
+                  "31 20 0:40 / /srv/my\\040files rw shared:1 - nfs4 host:/ rw\n"
+                  "32 31 8:2 / /srv/my\\040files/local rw - xfs /dev/b rw\n"
+                  "nonsense\n");
+  const MountTable table((dir / "mounts").c_str());
+  EXPECT_EQ(table.Find(32).beneath, (std::vector<uint64_t>{31, 20}));
+  EXPECT_TRUE(table.IsMounted(table.Find(32)));
+  EXPECT_FALSE(table.IsMounted({31, "8:9 / /srv/other"})) << "its number was given to another one";
+  EXPECT_EQ(table.NetworkMountOf("/srv/my files/a"), 31);
+  for (const char* path : {"/srv/my files/local/a", "/srv/my filesystem", "/srv", "/"}) {
+    EXPECT_EQ(table.NetworkMountOf(path), 0) << path;
+  }
+}
+
 class MountTest : public WatchSetTest {
  protected:
   /// What is told after each of: mounted, unmounted, mounted again, unmounted and mounted at once.
