@@ -32,6 +32,7 @@ namespace {
 using fileindex::StatusMgr;
 using std::chrono::milliseconds;
 using std::chrono::seconds;
+using std::chrono::steady_clock;
 
 /// The queue is looked at again after so long, whether or not it was seen to change.
 constexpr seconds kSlowTimer(30);
@@ -204,7 +205,7 @@ milliseconds ShareWorker::Round() {
 milliseconds ShareWorker::OnFailure(const Error& error) {
   if (std::exchange(last_failure_, error.Code()) != error.Code()) {
     delay_ = milliseconds(0);
-    failing_since_ = std::chrono::steady_clock::now();
+    failing_since_ = steady_clock::now();
   }
   index_exists_ = index_exists_ && error.Code() != Error::kEngineNoSuchIndex;
   try {
@@ -264,8 +265,8 @@ milliseconds ShareWorker::OnIndexPaused() {
 }
 
 bool ShareWorker::HasFailedTooLong(int code) const {
-  const auto since = last_failure_ == code ? failing_since_ : std::chrono::steady_clock::now();
-  return std::chrono::steady_clock::now() - since >= environment_.patience;
+  const auto since = last_failure_ == code ? failing_since_ : steady_clock::now();
+  return steady_clock::now() - since >= environment_.patience;
 }
 
 milliseconds ShareWorker::NextDelay(milliseconds first, milliseconds last) {
@@ -292,9 +293,11 @@ void ShareWorker::RunOnce() {
   } while (true);
 }
 
-/// A queue that has just changed is left for a while, unless somebody waits for it.
+/// A change after a quiet time goes at once; under load, passes come at this distance and so grow with it. Nobody who
+/// waits for the queue waits for that.
 void ShareWorker::Gather() {
-  if (!progress_.IsAwaited()) watch_.WaitForWake(environment_.gather_time);
+  const auto left = std::chrono::ceil<milliseconds>(last_pass_end_ + environment_.gather_time - steady_clock::now());
+  if (left.count() > 0 && !progress_.IsAwaited()) watch_.WaitForWake(left);
   interruption_.Check();
   serves_ = progress_.Asked();
 }
@@ -344,7 +347,7 @@ bool ShareWorker::AwaitsEvent() {
     awaits_since_.reset();
     return false;
   }
-  const auto now = std::chrono::steady_clock::now();
+  const auto now = steady_clock::now();
   if (!awaits_since_) awaits_since_ = now;
   if (now - *awaits_since_ < environment_.patience) return true;
   // The others are compared in the same pass.
@@ -396,6 +399,7 @@ void ShareWorker::RunPass() {
   QueueAgainIfChanged(runner, folders);
   applied_.Set(folders, mount_point);
   status_.EndPass();
+  last_pass_end_ = steady_clock::now();
 }
 
 /// Where the folders differ from those that the index is in line with is compared, too: a reindex that waits in the

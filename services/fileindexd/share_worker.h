@@ -51,7 +51,7 @@ class ShareWorker {
     const PauseState& pause;
     /// The index of a share.
     std::function<std::unique_ptr<ShareIndex>(const std::string& share)> open_index = &EngineShareIndex;
-    /// A queue that has just changed is left for so long, since changes seldom come alone.
+    /// From the end of a pass to the beginning of the next: changes seldom come alone.
     std::chrono::milliseconds gather_time{100};
     /// While an operation goes on, an index may be missing or paused for a moment, or the event that tells of a rename.
     /// What takes longer than this was not finished.
@@ -131,7 +131,8 @@ class ShareWorker {
   std::atomic<uint64_t> folder_count_{0};
   int last_failure_ = 0;
   std::chrono::steady_clock::time_point failing_since_;  ///< with that failure
-  std::chrono::milliseconds delay_{0};                   ///< grows while the same failure comes again
+  std::chrono::steady_clock::time_point last_pass_end_;
+  std::chrono::milliseconds delay_{0};  ///< grows while the same failure comes again
   bool told_no_space_ = false;
   bool away_ = false;  ///< the share's folder, or its volume, was not there
   ShareStatus status_;
