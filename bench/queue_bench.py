@@ -50,6 +50,11 @@ class Bench:
 
     def make(self, count, below):
         paths = [f"{self.folder}/{below}/{i // PER_FOLDER}/f{i}.txt" for i in range(count)]
+        folders = sorted({os.path.dirname(path) for path in paths})
+        for folder in folders:
+            os.makedirs(folder)
+        self.host.queue(self.folder, instance.event(CREATE, f"{self.folder}/{below}", "", True))
+        self.sync()
         for path in paths:
             instance.write(path, self.text())
         return paths

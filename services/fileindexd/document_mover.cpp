@@ -11,8 +11,25 @@ namespace ferrox::indexd {
 
 namespace {
 
+/// A folder with fewer documents is moved in one request, which tells of each of them: both sides hold it in memory.
+constexpr unsigned kMovedAtOnce = 20000;
+
 bool IsAtOrBelow(const std::string& path, const std::string& folder) {
   return StringStartWith(path + "/", folder + "/");
+}
+
+bool IsFolder(const std::string& path) {
+  struct stat status = {};
+  return LookAt(path, status) == Presence::kThere && S_ISDIR(status.st_mode);
+}
+
+std::vector<std::string> EntriesOf(const std::string& folder) {
+  std::vector<std::string> entries;
+  std::error_code error;
+  for (std::filesystem::directory_iterator at(folder, error), end; !error && at != end; at.increment(error)) {
+    entries.push_back(at->path().string());
+  }
+  return entries;
 }
 
 }  // namespace
@@ -20,32 +37,31 @@ bool IsAtOrBelow(const std::string& path, const std::string& folder) {
 void DocumentMover::Move(const std::string& path, const std::string& old_path) {
   if (IsAtOrBelow(path, old_path) || IsAtOrBelow(old_path, path)) return;
   for (const std::string& top : IndexedTopsOf(path)) {
-    interruption_.Check();
-    const std::string old_top = old_path + top.substr(path.size());
-    if (!HoldsDocumentsOf(old_top, top)) continue;
-    writer_.WillChange();
-    try {
-      index_.Rename(top, old_top);
-    } catch (const Error& error) {
-      if (error.Code() != Error::kEngineNoSuchDocument) throw;
-    }
+    MoveTree(top, old_path + top.substr(path.size()));
   }
 }
 
-/// The paths that have documents, at or below one that was renamed, without those below another of them.
+/// Of a folder with very many documents, each entry on its own; the folder's own document is left to the comparison.
+void DocumentMover::MoveTree(const std::string& path, const std::string& old_path) {
+  interruption_.Check();
+  if (!HoldsDocumentsOf(old_path, path)) return;
+  if (IsFolder(path) && index_.List(old_path, "", kMovedAtOnce).size() == kMovedAtOnce) {
+    for (const std::string& entry : EntriesOf(path)) MoveTree(entry, old_path + entry.substr(path.size()));
+    return;
+  }
+  writer_.WillChange();
+  try {
+    index_.Rename(path, old_path);
+  } catch (const Error& error) {
+    if (error.Code() != Error::kEngineNoSuchDocument) throw;
+  }
+}
+
+/// The paths that have documents, at or below one that was renamed, without those below another of them. The root
+/// itself has no document that the engine could move with all below it.
 std::vector<std::string> DocumentMover::IndexedTopsOf(const std::string& path) {
   if (rules_.PlaceOf(path) == PathRules::Place::kOutside) return {};
-  return path == root_ && rules_.CanBeIndexed(path) ? EntriesOfRoot() : folders_.Topmost(path);
-}
-
-/// The root itself has no document that the engine could move with all below it.
-std::vector<std::string> DocumentMover::EntriesOfRoot() const {
-  std::vector<std::string> entries;
-  std::error_code error;
-  for (std::filesystem::directory_iterator at(root_, error), end; !error && at != end; at.increment(error)) {
-    entries.push_back(at->path().string());
-  }
-  return entries;
+  return path == root_ && rules_.CanBeIndexed(path) ? EntriesOf(root_) : folders_.Topmost(path);
 }
 
 /// Whether what the index has at the old path is what is at the new one now. When that has gone on to yet another

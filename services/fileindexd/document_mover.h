@@ -27,8 +27,8 @@ class DocumentMover {
   void Move(const std::string& path, const std::string& old_path);
 
  private:
+  void MoveTree(const std::string& path, const std::string& old_path);
   std::vector<std::string> IndexedTopsOf(const std::string& path);
-  std::vector<std::string> EntriesOfRoot() const;
   bool HoldsDocumentsOf(const std::string& old_path, const std::string& path);
 
   const std::string& root_;

@@ -71,10 +71,10 @@ void DocumentWriter::RecordFailure(const Error& error, const std::string& path) 
   status_.AddFailure(error.what(), path);
 }
 
-void DocumentWriter::Remove(const std::string& path) {
+void DocumentWriter::Remove(const std::vector<std::string>& paths, bool and_below) {
   WillChange();
-  index_.Delete(path);
-  status_.DocumentDeleted();
+  index_.Delete(paths, and_below);
+  status_.DocumentsDeleted(paths.size());
 }
 
 void DocumentWriter::RemoveBelow(const std::string& folder) {

@@ -4,6 +4,7 @@
 
 #include <atomic>
 #include <string>
+#include <vector>
 
 #include "common/error.h"
 #include "services/fileindexd/share_folders.h"
@@ -36,7 +37,9 @@ class DocumentWriter {
   /// content is read. Does nothing when it is gone already: a later operation knows its present place and still needs
   /// the document.
   void RefreshRenamed(const std::string& path, const std::string& old_path);
-  void Remove(const std::string& path);
+  void Remove(const std::string& path) { Remove(std::vector<std::string>{path}, false); }
+  /// The documents at the paths, and, with `and_below`, all below them.
+  void Remove(const std::vector<std::string>& paths, bool and_below);
   /// Removes all below a folder at once.
   void RemoveBelow(const std::string& folder);
 

@@ -49,7 +49,9 @@ OperationRunner::OperationRunner(const PassContext& context)
       rules_(context.share, context.root, context.folders),
       writer_(context.index, context.folders, context.status),
       mover_(context_.root, context.index, context.folders, rules_, writer_, context.interruption),
-      tasks_(context.pool, context.interruption) {}
+      tasks_(context.pool, context.interruption),
+      gone_trees_(tasks_, writer_, true),
+      gone_(tasks_, writer_, false) {}
 
 void OperationRunner::Run(const std::function<void(const std::function<void(const fileindex::OP&)>&)>& each,
                           const std::vector<std::string>& also_compare) {
@@ -57,6 +59,7 @@ void OperationRunner::Run(const std::function<void(const std::function<void(cons
   each([&operations](const fileindex::OP&) { ++operations; });
   context_.status.BeginPass(operations);
   each([this](const fileindex::OP& op) { CarryOut(op, Stage::kMove); });
+  gone_trees_.Flush();
   tasks_.Wait();
   each([this](const fileindex::OP& op) {
     CarryOut(op, Stage::kLook);
@@ -110,14 +113,11 @@ void OperationRunner::Commit() {
 
 void OperationRunner::MoveDelete(const std::string& path, const std::string&) {
   struct stat status = {};
-  if (LookAt(path, status) != Presence::kGone) return;
-  tasks_.Submit([this, path] {
-    writer_.Remove(path);
-    writer_.RemoveBelow(path);
-  });
+  if (LookAt(path, status) == Presence::kGone) gone_trees_.Add(path);
 }
 
 void OperationRunner::MoveRename(const std::string& path, const std::string& old_path) {
+  gone_trees_.Flush();
   tasks_.Wait();
   mover_.Move(path, old_path);
 }
@@ -213,9 +213,8 @@ void OperationRunner::RemoveBelow(const std::string& folder) {
   while (true) {
     const std::vector<IndexedEntry> page = context_.index.List(folder, "", kRemovedAtOnce);
     if (page.size() < kRemovedAtOnce) break;
-    for (const IndexedEntry& entry : page) {
-      tasks_.Submit([this, path = entry.path] { writer_.Remove(path); });
-    }
+    for (const IndexedEntry& entry : page) gone_.Add(entry.path);
+    gone_.Flush();
     tasks_.Wait();
     CommitIfDue();
   }
@@ -260,6 +259,7 @@ void OperationRunner::CompareFolder(const std::string& folder) {
 
   context_.status.BeginComparison(folder);
   CompareBelow(folder, walk, context_.index, Actions(folder));
+  gone_.Flush();
   tasks_.Wait();
   context_.status.LinksSkipped(walk.LinksSkipped());
   context_.status.EndComparison();
@@ -273,7 +273,7 @@ ComparisonActions OperationRunner::Actions(const std::string& folder) {
   actions.write = [this](const std::string& path, const struct stat&) {
     tasks_.Submit([this, path] { writer_.Write(path); });
   };
-  actions.remove = [this](const std::string& path) { tasks_.Submit([this, path] { writer_.Remove(path); }); };
+  actions.remove = [this](const std::string& path) { gone_.Add(path); };
   const auto count = std::make_shared<std::unique_ptr<FileCount>>();
   actions.examined = [this, folder, count, examined = uint64_t{0}]() mutable {
     context_.interruption.Check();

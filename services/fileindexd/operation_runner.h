@@ -14,6 +14,7 @@
 #include "services/fileindexd/document_writer.h"
 #include "services/fileindexd/interruption.h"
 #include "services/fileindexd/path_rules.h"
+#include "services/fileindexd/removal_batch.h"
 #include "services/fileindexd/share_folders.h"
 #include "services/fileindexd/share_index.h"
 #include "services/fileindexd/share_place.h"
@@ -95,6 +96,8 @@ class OperationRunner {
   DocumentWriter writer_;
   DocumentMover mover_;
   TaskGroup tasks_;
+  RemovalBatch gone_trees_;
+  RemovalBatch gone_;
   std::set<std::string> compared_;
   bool had_reindex_ = false;
   std::chrono::steady_clock::time_point last_commit_ = std::chrono::steady_clock::now();

@@ -28,6 +28,18 @@ IndexedEntry ToEntry(const Json::Value& fields) {
   return entry;
 }
 
+/// The engine channel only logs that a part of a compound request failed.
+void ThrowIfFailed(const Json::Value& part) {
+  bool success = false;
+  GetJsonValue(success, part, "success", true);
+  if (success) return;
+  int code = 0;
+  std::string message;
+  GetJsonValue(code, part["error"], "code", true);
+  GetJsonValue(message, part["error"], "msg", true);
+  throw Error(static_cast<Error::ErrorCode>(code), message);
+}
+
 class Engine : public ShareIndex {
  public:
   explicit Engine(const std::string& share) : share_(share), id_(elastic::GetFileIndexID(share)) {}
@@ -58,7 +70,26 @@ class Engine : public ShareIndex {
   void Resume() override { elastic::ShareIndexResume(share_); }
   void Upsert(const std::string& path, bool need_meta) override { elastic::IndexUpsert(share_, path, need_meta); }
   void Attr(const std::string& path) override { elastic::IndexAttr(share_, path); }
-  void Delete(const std::string& path) override { elastic::IndexDel(share_, path); }
+  void Delete(const std::vector<std::string>& paths, bool and_below) override {
+    if (paths.size() == 1) {
+      elastic::IndexDel(share_, paths.front());
+      if (and_below) elastic::IndexDelDir(share_, paths.front());
+      return;
+    }
+    Json::Value request;
+    for (const std::string& path : paths) {
+      Json::Value part = Request("document_del_by_id");
+      part["data"]["doc_id"] = path;
+      request["compound"].append(std::move(part));
+      if (!and_below) continue;
+      part = Request("document_del_by_query");
+      part["data"]["query"]["qsl"]["prefix"][kPathField] = path + "/";
+      request["compound"].append(std::move(part));
+    }
+    Json::Value reply;
+    elastic::SendRequest(reply, request);
+    for (const Json::Value& part : reply["data"]) ThrowIfFailed(part);
+  }
   void DeleteBelow(const std::string& folder) override { elastic::IndexDelDir(share_, folder); }
   void Rename(const std::string& new_path, const std::string& old_path) override {
     elastic::IndexRename(share_, new_path, old_path);

@@ -29,7 +29,9 @@ class ShareIndex {
   virtual void Resume() = 0;
   virtual void Upsert(const std::string& path, bool need_meta) = 0;
   virtual void Attr(const std::string& path) = 0;
-  virtual void Delete(const std::string& path) = 0;
+  /// Removes the documents at the paths, and, with `and_below`, all below them; in one request. Missing ones are no
+  /// error.
+  virtual void Delete(const std::vector<std::string>& paths, bool and_below) = 0;
   virtual void DeleteBelow(const std::string& folder) = 0;
   virtual void Rename(const std::string& new_path, const std::string& old_path) = 0;
   virtual void Commit() = 0;

@@ -56,7 +56,7 @@ class ShareStatus {
   void SetEstimate(uint64_t files, bool complete);
 
   void DocumentWritten();
-  void DocumentDeleted() { Add(deleted_, 1); }
+  void DocumentsDeleted(uint64_t count) { Add(deleted_, count); }
   void LinksSkipped(uint64_t count) { Add(links_skipped_, count); }
   /// A file that could not be indexed as it should; it did not stop the work.
   void AddFailure(const std::string& reason, const std::string& path);

@@ -6,6 +6,7 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <cerrno>
 #include <utility>
 #include <vector>
 
@@ -380,11 +381,22 @@ bool ShareWorker::Queue(int event, const std::string& path) {
   }
 }
 
+/// A writer is seen while it still holds the lock of the queue, for an instant; the detaching would try again only
+/// after some tenths of a second.
+void ShareWorker::AwaitFreeQueue() {
+  constexpr int kAttempts = 200;
+  for (int i = 0; i < kAttempts && HasContent(queue_path_); ++i) {
+    if (LockFile::Try(queue_path_, true) != nullptr || errno != EWOULDBLOCK) return;
+    interruption_.SleepFor(milliseconds(1));
+  }
+}
+
 void ShareWorker::RunPass() {
   const HeldFolder held(root_);
   const std::string mount_point = MountPointOf(root_, environment_.is_mount_point);
   CheckShare();
   fileindex::QueueMgr queue(queue_path_);
+  AwaitFreeQueue();
   if (!queue.PrepareTmpQueue() && !IsFileExist(queue_path_ + ".tmp")) return;
   // Only now: of folders that are changed later, the events are in a later queue.
   const ShareFolders folders = LoadFolders();

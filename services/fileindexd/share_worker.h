@@ -113,6 +113,7 @@ class ShareWorker {
   void QueueNeededReindex();
   bool HoldsStrays();
   bool Queue(int event, const std::string& path);
+  void AwaitFreeQueue();
   void RunPass();
   void RunOperations(fileindex::QueueMgr& queue, OperationRunner& runner, const ShareFolders& folders);
   ShareFolders LoadFolders();

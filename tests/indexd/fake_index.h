@@ -51,9 +51,12 @@ class FakeIndex : public indexd::ShareIndex {
     RequireDocument(path).stamp = stamp;
   }
 
-  void Delete(const std::string& path) override {
-    const std::lock_guard lock(mutex);
-    documents.erase(path);
+  void Delete(const std::vector<std::string>& paths, bool and_below) override {
+    for (const std::string& path : paths) {
+      if (and_below) DeleteBelow(path);
+      const std::lock_guard lock(mutex);
+      documents.erase(path);
+    }
   }
 
   void DeleteBelow(const std::string& folder) override {

@@ -96,6 +96,7 @@ TEST_F(SyncTest, ReasonIsTold) {
 }
 
 TEST_F(SyncTest, SetAsksItsWorkersAndNamesSharesWithoutOne) {
+  worker->Stop();  // one works on a queue
   WorkerSet workers([this](const std::string&) { return MakeWorker(); });
   workers.Reconcile();
   const auto end = steady_clock::now() + seconds(60);
