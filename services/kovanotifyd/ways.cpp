@@ -1,9 +1,11 @@
 #include "services/kovanotifyd/ways.h"
 
 #include <algorithm>
+#include <utility>
 
 #include "common/file_util.h"
 #include "common/paths.h"
+#include "services/kovanotifyd/filesystem_watcher.h"
 
 namespace ferrox::notifyd {
 
@@ -15,11 +17,20 @@ struct KnownWay {
   std::unique_ptr<Watcher> (*make)(const std::string& cookie_path);
 };
 
+std::unique_ptr<Watcher> MakeFilesystemWatcher(const std::string& cookie_path) {
+  FilesystemWatcher::Options options;
+  options.cookie = cookie_path;
+  for (const std::string& path : OwnPaths()) {
+    if (path.back() == '/') options.quiet_folders.push_back(path);
+  }
+  return std::make_unique<FilesystemWatcher>(std::move(options));
+}
+
 constexpr char kCookies[] = "/var/lib/kova/notifyd/cookies/";
 
 /// The best first.
 constexpr KnownWay kWays[] = {
-    {"fanotify", "fanotify", nullptr},
+    {"fanotify", "fanotify", MakeFilesystemWatcher},
     {"fanotify inode marks", "inode_marks", nullptr},
     {"inotify", "inotify", nullptr},
 };

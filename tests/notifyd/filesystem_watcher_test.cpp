@@ -1,0 +1,339 @@
+#include "services/kovanotifyd/filesystem_watcher.h"
+
+#include <fcntl.h>
+#include <sched.h>
+#include <sys/mount.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <cstdio>
+#include <cstring>
+#include <filesystem>
+#include <functional>
+#include <map>
+#include <random>
+#include <set>
+#include <string>
+#include <utility>
+#include <vector>
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include "common/scope_exit.h"
+#include "tests/support/temp_dir.h"
+
+namespace ferrox::notifyd {
+namespace {
+
+using test::TempDir;
+using test::WriteFile;
+using testing::ElementsAre;
+using testing::ElementsAreArray;
+using testing::IsEmpty;
+namespace fs = std::filesystem;
+
+/// Writes down what it is told, one word and the paths below the test's folder.
+class Notebook : public WatchListener {
+ public:
+  explicit Notebook(std::string top) : top_(std::move(top)) {}
+
+  void OnChange(Change change) override {
+    static const char* const kWords[] = {"created", "modified", "written",  "attributes",
+                                         "deleted", "renamed",  "uncertain"};
+    const std::string old = change.old_path.empty() ? "" : Short(change.old_path) + " ";
+    Note(kWords[static_cast<int>(change.kind)] + std::string(change.is_folder ? "/ " : " ") + old + Short(change.path));
+    changes.push_back(std::move(change));
+  }
+  void OnCovered(const std::string& root) override { Note("covered " + Short(root)); }
+  void OnRefused(const std::string& root, const std::string& reason) override {
+    Note("refused " + Short(root));
+    refusal = reason;
+  }
+  void OnLost() override { Note("lost"); }
+  void OnRootDisturbed(const std::string& root) override { Note("disturbed " + Short(root)); }
+  void OnCookie() override { Note("cookie"); }
+
+  std::vector<std::string> Take() { return std::exchange(lines, {}); }
+
+  std::vector<std::string> lines = {};
+  std::vector<Change> changes = {};
+  std::string refusal = {};
+
+ private:
+  std::string Short(const std::string& path) const { return path.substr(std::min(path.size(), top_.size() + 1)); }
+  void Note(std::string line) { lines.push_back(std::move(line)); }
+
+  std::string top_;
+};
+
+class FilesystemWatcherTest : public testing::Test {
+ protected:
+  void SetUp() override {
+    fs::create_directory(Root());
+    fs::create_directories(dir_ / "state");
+    WriteFile(dir_ / "cookie", "");
+    Watch({});
+  }
+
+  std::string Root() const { return dir_ / "r"; }
+
+  /// Watches the root, or skips the test where the kernel does not grant that.
+  void Watch(FilesystemWatcher::Options options) {
+    options.cookie = dir_ / "cookie";
+    options.quiet_folders = {dir_ / "state"};
+    watcher_ = std::make_unique<FilesystemWatcher>(options);
+    watcher_->Add({Root()});
+    while (watcher_->Advance(std::chrono::milliseconds(10), notes_)) {
+    }
+    if (!notes_.refusal.empty()) GTEST_SKIP() << notes_.refusal;
+    ASSERT_THAT(notes_.Take(), ElementsAre("covered r"));
+  }
+
+  std::vector<std::string> Told() {
+    while (watcher_->Read(notes_)) {
+    }
+    return notes_.Take();
+  }
+
+  TempDir dir_;
+  Notebook notes_{dir_.Path()};
+  std::unique_ptr<FilesystemWatcher> watcher_;
+};
+
+TEST_F(FilesystemWatcherTest, TellsWhatHappened) {
+  const std::string root = Root();
+  const std::string outside = dir_ / "outside";
+  fs::create_directories(outside + "/full/below");
+  struct Row {
+    const char* what;
+    std::function<void()> act;
+    std::vector<std::string> told;
+  };
+  const std::vector<Row> rows = {
+      {"new file", [&] { WriteFile(root + "/f", "1"); }, {"created r/f", "written r/f"}},
+      {"written", [&] { WriteFile(root + "/f", "22"); }, {"written r/f"}},
+      {"mode", [&] { (void)chmod((root + "/f").c_str(), 0600); }, {"attributes r/f"}},
+      {"rename", [&] { fs::rename(root + "/f", root + "/g"); }, {"renamed r/f r/g"}},
+      {"link", [&] { fs::create_hard_link(root + "/g", root + "/h"); }, {"created r/h"}},
+      {"replaced", [&] { fs::rename(outside + "/full/below", root + "/d"); }, {"created/ r/d"}},
+      {"folder's mode", [&] { (void)chmod((root + "/d").c_str(), 0700); }, {"attributes/ r/d"}},
+      {"root's mode", [&] { (void)chmod(root.c_str(), 0700); }, {"attributes/ r"}},
+      {"into a folder", [&] { fs::rename(root + "/h", root + "/d/h"); }, {"renamed r/h r/d/h"}},
+      {"exchange",
+       [&] { (void)renameat2(AT_FDCWD, (root + "/d").c_str(), AT_FDCWD, (root + "/g").c_str(), RENAME_EXCHANGE); },
+       {"renamed/ r/d r/g", "created r/d"}},
+      {"delete", [&] { fs::remove(root + "/d"); }, {"deleted r/d"}},
+      {"out", [&] { fs::rename(root + "/g", outside + "/g"); }, {"deleted/ r/g"}},
+      {"outside", [&] { WriteFile(outside + "/g/f", "1"); }, {}},
+      {"in", [&] { fs::rename(outside + "/g", root + "/i"); }, {"created/ r/i"}},
+      {"below", [&] { fs::remove(root + "/i/h"), fs::remove(root + "/i/f"); }, {"deleted r/i/h", "deleted r/i/f"}},
+      {"removed while behind",
+       [&] { WriteFile(root + "/i/x", "1"), fs::remove_all(root + "/i"); },
+       {"deleted r/i/x", "deleted/ r/i"}},
+      {"the cookie", [&] { (void)utimensat(AT_FDCWD, (dir_ / "cookie").c_str(), nullptr, 0); }, {"cookie"}},
+      {"above",
+       [&] { fs::rename(dir_.Path(), dir_.Path() + "-"), fs::rename(dir_.Path() + "-", dir_.Path()); },
+       {"disturbed r", "disturbed r"}},
+      {"the root", [&] { fs::rename(root, dir_ / "s"); }, {"disturbed r"}},
+  };
+  for (const Row& row : rows) {
+    SCOPED_TRACE(row.what);
+    row.act();
+    EXPECT_THAT(Told(), ElementsAreArray(row.told));
+  }
+  EXPECT_EQ(watcher_->Watches(Root()), 1U);
+  watcher_->Remove(Root());
+  WriteFile(dir_ / "s/f", "1");
+  EXPECT_THAT(Told(), IsEmpty());
+}
+
+TEST_F(FilesystemWatcherTest, NamesInDoubtAreToldWhenTheKernelJoinsRecords) {
+  const std::string a = Root() + "/a";
+  const std::string b = Root() + "/b";
+  fs::create_directory(a);
+  (void)Told();
+  for (const auto& [from, to] : {std::pair(a, b), {b, a}, {a, b}}) fs::rename(from, to);
+  WriteFile(b + "/f", "");
+  const std::vector<std::string> told = Told();
+  EXPECT_THAT(told, testing::IsSupersetOf({"uncertain r/a", "uncertain r/b"}));
+  WriteFile(b + "/g", "");
+  EXPECT_THAT(Told(), ElementsAre("created r/b/g", "written r/b/g")) << "the folder was looked for";
+}
+
+TEST_F(FilesystemWatcherTest, AnOverflowIsToldAndThenAllIsCoveredAgain) {
+  for (int i = 0; i < 20000; ++i) {
+    (void)mknod((Root() + "/f" + std::to_string(i)).c_str(), S_IFREG | 0600, 0);
+  }
+  EXPECT_THAT(Told(), testing::IsSupersetOf({"lost", "disturbed r", "covered r"}));
+  WriteFile(Root() + "/f1", "1");
+  EXPECT_THAT(Told(), ElementsAre("written r/f1"));
+}
+
+TEST_F(FilesystemWatcherTest, QuietFoldersDoNotWakeIt) {
+  for (int i = 0; i < 3; ++i) WriteFile(dir_ / "state/queue", "line\n");
+  EXPECT_THAT(Told(), IsEmpty());
+  // Other programs may write to the same file system meanwhile, but hardly each time.
+  bool is_silent = false;
+  for (int i = 0; i < 100 && !is_silent; ++i) {
+    WriteFile(dir_ / "state/queue", "line\n");
+    is_silent = !watcher_->Read(notes_);
+  }
+  EXPECT_TRUE(is_silent);
+}
+
+/// What a listener that believes every word holds of the root.
+class BelievedTree {
+ public:
+  std::string Apply(const Change& change, bool is_strict) {
+    const bool is_known = names_.count(change.path) != 0;
+    switch (change.kind) {
+      case Change::Kind::kCreated:
+        if (is_strict && is_known) return "there already: " + change.path;
+        names_[change.path] = change.is_folder;
+        if (change.is_folder && !is_strict) in_doubt_.insert(change.path);  // the other half of an exchange is full
+        break;
+      case Change::Kind::kDeleted:
+        Erase(change.path);  // of what was made and removed at once, only the latter is told
+        break;
+      case Change::Kind::kRenamed:
+        if (is_strict && names_.count(change.old_path) == 0) return "not there: " + change.old_path;
+        Move(change.old_path, change.path, change.is_folder);
+        break;
+      case Change::Kind::kUncertain:
+        if (is_strict) return "in doubt: " + change.path;
+        in_doubt_.insert(change.path);
+        break;
+      default:
+        if (is_strict && !is_known) return "not there: " + change.path;
+    }
+    return "";
+  }
+
+  void LookAtWhatIsInDoubt() {
+    for (const std::string& path : in_doubt_) {
+      Erase(path);
+      const fs::file_status status = fs::symlink_status(path);
+      if (!fs::exists(status)) continue;
+      names_[path] = fs::is_directory(status);
+      if (!fs::is_directory(status)) continue;
+      for (const auto& entry : fs::recursive_directory_iterator(path)) names_[entry.path()] = entry.is_directory();
+    }
+  }
+
+  const std::map<std::string, bool>& Names() const { return names_; }
+
+ private:
+  static bool IsAtOrBelow(const std::string& path, const std::string& top) {
+    return path == top || path.compare(0, top.size() + 1, top + "/") == 0;
+  }
+  void Erase(const std::string& top) {
+    std::erase_if(names_, [&top](const auto& name) { return IsAtOrBelow(name.first, top); });
+  }
+  void Move(const std::string& from, const std::string& to, bool is_folder) {
+    std::map<std::string, bool> moved = {{to, is_folder}};
+    for (const auto& [path, kind] : names_) {
+      if (IsAtOrBelow(path, from)) moved[to + path.substr(from.size())] = kind;
+    }
+    std::set<std::string> doubts;
+    for (const std::string& path : in_doubt_)
+      doubts.insert(IsAtOrBelow(path, from) ? to + path.substr(from.size()) : path);
+    in_doubt_.merge(doubts);
+    Erase(from);
+    Erase(to);
+    names_.merge(moved);
+  }
+
+  std::map<std::string, bool> names_;
+  std::set<std::string> in_doubt_;
+};
+
+/// Random changes of a tree. Few names come again and again; fresh ones never, and so no records are joined.
+class RandomChanges {
+ public:
+  RandomChanges(std::string root, unsigned seed, bool fresh_names)
+      : root_(std::move(root)), random_(seed), fresh_names_(fresh_names) {}
+
+  void Do() {
+    const std::vector<fs::path> all = {fs::recursive_directory_iterator(root_), fs::recursive_directory_iterator()};
+    const auto any = [&] { return all.empty() ? fs::path(root_) : all[random_() % all.size()]; };
+    const fs::path folder = fs::is_directory(any()) ? any() : fs::path(root_);
+    const fs::path place = (fs::is_directory(folder) ? folder : fs::path(root_)) / NextName();
+    const fs::path victim = any();
+    switch (random_() % 10) {
+      case 0:
+      case 1:
+        (void)mkdir(place.c_str(), 0755);
+        return;
+      case 2:
+      case 3:
+        (void)close(open(place.c_str(), O_CREAT | O_WRONLY | O_CLOEXEC, 0644));
+        return;
+      case 4:
+        if (all.size() > 40) fs::remove_all(victim);
+        return;
+      case 5:
+        if (!fresh_names_) (void)renameat2(AT_FDCWD, victim.c_str(), AT_FDCWD, any().c_str(), RENAME_EXCHANGE);
+        return;
+      default:
+        if (victim != root_) (void)rename(victim.c_str(), place.c_str());
+    }
+  }
+
+ private:
+  std::string NextName() { return "n" + std::to_string(fresh_names_ ? next_++ : static_cast<int>(random_() % 5)); }
+
+  std::string root_;
+  std::mt19937 random_;
+  bool fresh_names_;
+  int next_ = 0;
+};
+
+TEST_F(FilesystemWatcherTest, ReplayOfWhatIsToldGivesTheTree) {
+  for (unsigned seed = 0; seed < 12; ++seed) {
+    const bool is_strict = seed % 2 == 0;
+    SCOPED_TRACE("seed " + std::to_string(seed));
+    FilesystemWatcher::Options options;
+    options.folders_max = 1 + seed * 3;
+    Watch(options);
+    if (IsSkipped()) return;
+    notes_.changes.clear();
+    RandomChanges changes(Root(), seed, is_strict);
+    std::mt19937 random(seed);
+    for (int i = 0; i < 250; ++i) {
+      changes.Do();
+      if (random() % 100 == 0) (void)watcher_->Read(notes_);
+    }
+    (void)Told();
+    BelievedTree tree;
+    for (const Change& change : notes_.changes) ASSERT_EQ(tree.Apply(change, is_strict), "");
+    tree.LookAtWhatIsInDoubt();
+    std::map<std::string, bool> real;
+    for (const auto& entry : fs::recursive_directory_iterator(Root())) real[entry.path()] = entry.is_directory();
+    ASSERT_EQ(tree.Names(), real);
+    fs::remove_all(Root());
+    fs::create_directory(Root());
+  }
+}
+
+TEST_F(FilesystemWatcherTest, AVolumeCanBeUnmountedAndComesAgain) {
+  if (unshare(CLONE_NEWNS) != 0) GTEST_SKIP() << "no mounts of one's own: " << strerror(errno);
+  ASSERT_EQ(mount(nullptr, "/", nullptr, MS_REC | MS_PRIVATE, nullptr), 0);
+  const std::string volume = dir_ / "volume";
+  fs::create_directory(volume);
+  for (int i = 0; i < 2; ++i) {
+    ASSERT_EQ(mount("none", volume.c_str(), "tmpfs", 0, nullptr), 0);
+    fs::create_directories(volume + "/share/sub");
+    watcher_->Add({volume + "/share"});
+    (void)watcher_->Advance(std::chrono::milliseconds(10), notes_);
+    EXPECT_THAT(notes_.Take(), ElementsAre("covered volume/share"));
+    WriteFile(volume + "/share/sub/f", "1");
+    EXPECT_THAT(Told(), ElementsAre("created volume/share/sub/f", "written volume/share/sub/f"));
+    ASSERT_EQ(umount(volume.c_str()), 0) << strerror(errno);
+  }
+}
+
+}  // namespace
+}  // namespace ferrox::notifyd
