@@ -5,7 +5,10 @@
 
 #include "common/file_util.h"
 #include "common/paths.h"
+#include "services/kovanotifyd/fan_inode_port.h"
 #include "services/kovanotifyd/filesystem_watcher.h"
+#include "services/kovanotifyd/folder_watcher.h"
+#include "services/kovanotifyd/inotify_port.h"
 
 namespace ferrox::notifyd {
 
@@ -14,10 +17,10 @@ namespace {
 struct KnownWay {
   const char* name;
   const char* cookie;
-  std::unique_ptr<Watcher> (*make)(const std::string& cookie_path);
+  std::unique_ptr<Watcher> (*make)(const std::string& cookie_path, std::string& refusal);
 };
 
-std::unique_ptr<Watcher> MakeFilesystemWatcher(const std::string& cookie_path) {
+std::unique_ptr<Watcher> MakeFilesystemWatcher(const std::string& cookie_path, std::string& /*refusal*/) {
   FilesystemWatcher::Options options;
   options.cookie = cookie_path;
   for (const std::string& path : OwnPaths()) {
@@ -26,13 +29,28 @@ std::unique_ptr<Watcher> MakeFilesystemWatcher(const std::string& cookie_path) {
   return std::make_unique<FilesystemWatcher>(std::move(options));
 }
 
+std::unique_ptr<Watcher> MakeInodeWatcher(const std::string& cookie_path, std::string& refusal) {
+  FanGroup group;
+  refusal = group.Open();
+  if (!refusal.empty()) return nullptr;
+  return std::make_unique<FolderWatcher>(std::make_unique<FanInodePort>(std::move(group)),
+                                         FolderWatcher::Options{cookie_path});
+}
+
+std::unique_ptr<Watcher> MakeInotifyWatcher(const std::string& cookie_path, std::string& refusal) {
+  auto port = std::make_unique<InotifyPort>();
+  refusal = port->Open();
+  if (!refusal.empty()) return nullptr;
+  return std::make_unique<FolderWatcher>(std::move(port), FolderWatcher::Options{cookie_path});
+}
+
 constexpr char kCookies[] = "/var/lib/kova/notifyd/cookies/";
 
 /// The best first.
 constexpr KnownWay kWays[] = {
     {"fanotify", "fanotify", MakeFilesystemWatcher},
-    {"fanotify inode marks", "inode_marks", nullptr},
-    {"inotify", "inotify", nullptr},
+    {"fanotify inode marks", "inode_marks", MakeInodeWatcher},
+    {"inotify", "inotify", MakeInotifyWatcher},
 };
 
 bool IsKnown(const std::string& name) {
@@ -52,7 +70,7 @@ void ChooseWays(const std::vector<std::string>& allowed, Notifier::Options& opti
   for (const KnownWay& known : kWays) {
     Way way = {known.name, nullptr, "switched off in the settings"};
     Cookie cookie(InstancePath((std::string(kCookies) + known.cookie).c_str()));
-    if (is_allowed(known.name) && known.make != nullptr) way.watcher = known.make(cookie.Path());
+    if (is_allowed(known.name)) way.watcher = known.make(cookie.Path(), way.refusal);
     options.ways.push_back(std::move(way));
     options.cookies.push_back(std::move(cookie));
   }

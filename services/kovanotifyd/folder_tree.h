@@ -1,0 +1,132 @@
+#pragma once
+
+#include <cstdint>
+#include <deque>
+#include <functional>
+#include <memory>
+#include <string>
+#include <string_view>
+#include <vector>
+
+namespace ferrox::notifyd {
+
+/// The kernel's name for a watched folder, as a port gives it; 0 is none.
+using FolderKey = uint64_t;
+
+/// A set of numbers that are found by the hash of what they stand for. Whoever uses it knows what that is.
+class IdTable {
+ public:
+  using Hash = std::function<uint32_t(uint32_t id)>;
+
+  explicit IdTable(Hash hash);
+
+  /// The id for which `matches` holds, among those with this hash and a few others; kNone without.
+  template <typename Matches>
+  uint32_t Find(uint32_t hash, Matches matches) const {
+    for (size_t at = hash & Mask();; at = (at + 1) & Mask()) {
+      if (slots_[at] == kEmpty) return kEmpty;
+      if (slots_[at] != kErased && matches(slots_[at])) return slots_[at];
+    }
+  }
+  void Insert(uint32_t id);
+  void Erase(uint32_t id);
+
+ private:
+  static constexpr uint32_t kEmpty = UINT32_MAX;
+  static constexpr uint32_t kErased = UINT32_MAX - 1;
+
+  size_t Mask() const { return slots_.size() - 1; }
+  void Rebuild();
+
+  Hash hash_;
+  std::vector<uint32_t> slots_;  ///< their number is a power of two
+  size_t used_ = 0;              ///< slots that are not empty
+  size_t live_ = 0;
+};
+
+/// Folders by name and by the kernel's key, from "/" down: those that are watched and those that lead to them. Moving
+/// or finding one costs the same however much is below it. About 100 bytes a folder.
+class FolderTree {
+ public:
+  using Id = uint32_t;
+  static constexpr Id kNone = UINT32_MAX;
+  static constexpr Id kTop = 0;
+
+  /// A folder for later, when it may be gone and its id another's.
+  struct Ref {
+    Id id = kNone;
+    uint16_t serial = 0;
+  };
+  enum Flag : uint8_t {
+    kRoot = 1,        ///< a root of the watcher
+    kPassage = 2,     ///< has a root below it
+    kUnreadable = 4,  ///< cannot be watched until its permissions change
+    kMoved = 8,       ///< renamed since the kernel's records had all been read
+    kSeen = 16,       ///< found by the listing under way
+  };
+
+  FolderTree();
+  FolderTree(const FolderTree&) = delete;
+  FolderTree& operator=(const FolderTree&) = delete;
+
+  Id Child(Id parent, std::string_view name) const;
+  /// The name must not be there yet.
+  Id Add(Id parent, std::string_view name);
+  /// The folder of an absolute path, made with all that lead to it where it is missing.
+  Id FindOrAdd(std::string_view path);
+  /// To a place where nothing is, and which is not below the folder itself.
+  void Move(Id id, Id parent, std::string_view name);
+  /// Removes a folder and all below it; each is handed to `before` first, deepest first. Never the top.
+  void Remove(Id id, const std::function<void(Id)>& before);
+
+  Id ByKey(FolderKey key) const;
+  /// The key must not be another folder's.
+  void SetKey(Id id, FolderKey key);
+  FolderKey Key(Id id) const { return nodes_[id].key; }
+  /// How many have one.
+  uint64_t Keys() const { return keys_; }
+
+  Id Parent(Id id) const { return nodes_[id].parent; }
+  Id FirstChild(Id id) const { return nodes_[id].first_child; }
+  Id NextSibling(Id id) const { return nodes_[id].next; }
+  std::string_view Name(Id id) const { return {nodes_[id].name.get(), nodes_[id].name_size}; }
+  std::string Path(Id id) const;
+  std::string Path(Id id, std::string_view name) const;
+  /// Whether a folder is `top` or below it.
+  bool IsWithin(Id id, Id top) const;
+
+  bool Has(Id id, Flag flag) const { return (nodes_[id].flags & flag) != 0; }
+  void Set(Id id, Flag flag, bool on);
+
+  Ref RefOf(Id id) const { return {id, nodes_[id].serial}; }
+  /// kNone when it is gone.
+  Id Get(Ref ref) const;
+
+ private:
+  struct Node {
+    FolderKey key = 0;
+    std::unique_ptr<char[]> name;
+    Id parent = kNone;  ///< of a free node: the next free one
+    Id first_child = kNone;
+    Id next = kNone;
+    Id previous = kNone;
+    uint16_t name_size = 0;
+    uint16_t serial = 0;  ///< odd while the node is in use
+    uint8_t flags = 0;
+  };
+
+  uint32_t PlaceHash(Id parent, std::string_view name) const;
+  uint32_t KeyHash(FolderKey key) const;
+  void SetName(Node& node, std::string_view name);
+  void Link(Id id, Id parent);
+  void Unlink(Id id);
+  Id Allocate();
+
+  std::deque<Node> nodes_;
+  Id free_ = kNone;
+  uint64_t keys_ = 0;
+  IdTable by_place_;
+  IdTable by_key_;
+};
+
+}  // namespace ferrox::notifyd
