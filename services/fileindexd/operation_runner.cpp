@@ -67,6 +67,7 @@ void OperationRunner::Run(const std::function<void(const std::function<void(cons
   });
   for (const std::string& path : also_compare) CompareOnce(path);
   tasks_.Wait();
+  RefreshSuspects();
   Commit();
 }
 
@@ -201,6 +202,22 @@ void OperationRunner::Compare(const std::string& path) {
   if (presence == Presence::kGone || place == Place::kOutside) return RemoveTree(path);
   CompareOne(path, place, status);
   S_ISDIR(status.st_mode) ? CompareFolder(path) : RemoveBelow(path);
+}
+
+/// A file with several names is told of under one of them. Once through them: what cannot be refreshed stays.
+void OperationRunner::RefreshSuspects() {
+  constexpr unsigned kPage = 1000;
+  std::string after;
+  for (size_t found = kPage; found == kPage;) {
+    const std::vector<IndexedEntry> page = context_.index.Suspects(after, kPage);
+    for (const IndexedEntry& entry : page) {
+      tasks_.Submit([this, path = entry.path] { writer_.RefreshAttributes(path); });
+    }
+    tasks_.Wait();
+    CommitIfDue();
+    found = page.size();
+    if (found > 0) after = page.back().path;
+  }
 }
 
 void OperationRunner::RemoveTree(const std::string& path) {

@@ -85,6 +85,7 @@ class OperationRunner {
   void Compare(const std::string& path);
   void CompareRoot();
   void RemoveStrays();
+  void RefreshSuspects();
   void RemoveTree(const std::string& path);
   void RemoveBelow(const std::string& folder);
   void CompareOne(const std::string& path, Place place, const struct stat& status);

@@ -111,6 +111,14 @@ class Engine : public ShareIndex {
     return Query(std::move(query));
   }
 
+  std::vector<IndexedEntry> Suspects(const std::string& after, unsigned limit) override {
+    Json::Value query;
+    query["qsl"]["suspects"] = true;
+    query["limit"] = limit;
+    if (!after.empty()) query["after"] = after;
+    return Query(std::move(query));
+  }
+
   Json::Value Figures() override {
     std::string text;
     Json::Value reply;

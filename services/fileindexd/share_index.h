@@ -39,6 +39,9 @@ class ShareIndex {
   virtual std::vector<IndexedEntry> List(const std::string& folder, const std::string& after, unsigned limit) = 0;
   /// The document at `path`; none or one.
   virtual std::vector<IndexedEntry> Find(const std::string& path) = 0;
+  /// At most `limit` documents, in byte order of their paths from behind `after`, of files with several names that
+  /// changed or lost a name under another of them.
+  virtual std::vector<IndexedEntry> Suspects(const std::string& after, unsigned limit) = 0;
   /// The engine's figures: "documents", "bytes_on_disk", "extract_errors" and others. Does not wait for the engine.
   virtual Json::Value Figures() = 0;
 };

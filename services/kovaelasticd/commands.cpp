@@ -125,6 +125,8 @@ Json::Value OnDocumentChange(CommandCall& call) {
 GetRequest ReadQuery(const Json::Value& query) {
   GetRequest request;
   const Json::Value& qsl = RequiredObject(query, "qsl");
+  request.suspects = qsl["suspects"].isBool() && qsl["suspects"].asBool() && qsl.size() == 1;
+  if (request.suspects) return request;
   const Json::Value& prefix = qsl["prefix"];
   const Json::Value& term = qsl["term"];
   const bool one = prefix.isNull() != term.isNull() && qsl.size() == 1;

@@ -13,13 +13,16 @@
 
 namespace ferrox::engine {
 
-/// Which documents Get lists: the one at `term`, or those whose path begins with `prefix`, in the order of their paths.
+/// Which documents Get lists: the one at `term`, or the suspects, or those whose path begins with `prefix`, in the
+/// order of their paths.
 struct GetRequest {
   std::string term;
   std::string prefix;
   std::string after;                ///< only paths behind this one
   int64_t limit = -1;               ///< at most so many; below 0: all
   std::vector<std::string> fields;  ///< the fields to load; empty: all
+  /// Documents that may not know of a change of their file, which was told of under another of its names.
+  bool suspects = false;
 };
 
 enum class SortKey { kRelevance, kDate, kName, kSize };

@@ -72,6 +72,7 @@ SqliteStore::SqliteStore(const std::string& path, bool create, std::shared_ptr<c
   RegisterFullText(writer_);
   if (create && writer_.QueryInt("SELECT count(*) FROM sqlite_master") == 0) MakeTables();
   CheckFormat();
+  links_.MakeTables();
   LoadFieldNames(writer_, names_);
   totals_ = LoadTotals(writer_);
   SyncIndexFolder(Dirname(path));

@@ -8,6 +8,7 @@
 #include <vector>
 
 #include "services/kovaelasticd/document.h"
+#include "services/kovaelasticd/file_links.h"
 #include "services/kovaelasticd/index_store.h"
 #include "services/kovaelasticd/schema.h"
 #include "services/kovaelasticd/sqlite_db.h"
@@ -62,7 +63,7 @@ class SqliteStore : public IndexStore {
   void AddFieldNames(const Json::Value& document);
 
   Pending& Touch(const StoredDocument& stored);
-  void InsertRow(const DocRow& row, int64_t text_bytes);
+  int64_t InsertRow(const DocRow& row, int64_t text_bytes);
   void UpdateRow(int64_t id, const DocRow& row, int64_t text_bytes);
   void Remove(const StoredDocument& stored);
   void MoveAway(const std::string& path);
@@ -83,6 +84,7 @@ class SqliteStore : public IndexStore {
   Database writer_;
   TextCodec codec_;
   FieldNames names_;
+  FileLinks links_{writer_, names_};
   Totals totals_;
   std::map<int64_t, Pending> pending_;
   int64_t pending_bytes_ = 0;

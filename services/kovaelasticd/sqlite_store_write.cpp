@@ -68,13 +68,14 @@ void SqliteStore::Changed(int64_t bytes) {
   if (pending_bytes_ >= kPendingMaxBytes) Flush();
 }
 
-void SqliteStore::InsertRow(const DocRow& row, int64_t text_bytes) {
+int64_t SqliteStore::InsertRow(const DocRow& row, int64_t text_bytes) {
   Statement statement = writer_.Prepare("INSERT INTO docs VALUES(?1, ?2, ?3, ?4, ?5, ?6, ?7, ?8, ?9, ?10, ?11)");
   statement.BindNull(1);
   BindRow(statement, row, text_bytes);
   statement.Run();
   ++totals_.documents;
   CountText(0, text_bytes);
+  return sqlite3_last_insert_rowid(writer_.Handle());
 }
 
 void SqliteStore::UpdateRow(int64_t id, const DocRow& row, int64_t text_bytes) {
@@ -98,9 +99,11 @@ void SqliteStore::Upsert(const std::string& path, const Json::Value& document) {
     pending = &Touch(*before);
     UpdateRow(before->id, row, text_bytes);
     CountText(before->text_bytes, text_bytes);
+    links_.OnChange(before->id, &before->row, &row);
   } else {
-    InsertRow(row, text_bytes);
-    pending = &pending_[sqlite3_last_insert_rowid(writer_.Handle())];
+    const int64_t id = InsertRow(row, text_bytes);
+    pending = &pending_[id];
+    links_.OnChange(id, nullptr, &row);
   }
   pending->new_meta = MakeMetaText(row, document, *schema_);
   pending->text_changed = true;
@@ -130,6 +133,7 @@ void SqliteStore::Set(const std::string& path, const Json::Value& changes) {
   Pending& pending = Touch(*before);
   UpdateRow(before->id, row, text_bytes);
   CountText(before->text_bytes, text_bytes);
+  links_.OnChange(before->id, &before->row, &row);
   pending.new_meta = MakeMetaText(row, document, *schema_);
   if (text_changed) {
     pending.text_changed = true;
@@ -152,6 +156,7 @@ void SqliteStore::Remove(const StoredDocument& stored) {
   pending.text_changed = true;
   pending.text.reset();
   writer_.Prepare("DELETE FROM docs WHERE id = ?1").Bind(1, stored.id).Run();
+  links_.OnChange(stored.id, &stored.row, nullptr);
   --totals_.documents;
   CountText(stored.text_bytes, 0);
   Changed(stored.text_bytes);
@@ -196,6 +201,13 @@ void SqliteStore::Get(const GetRequest& request, const std::function<void(const 
   if (!request.term.empty()) {
     const std::optional<StoredDocument> stored = FindDocument(writer_, request.term);
     if (stored.has_value()) take(LoadEntry(*stored, request.fields));
+    return;
+  }
+  if (request.suspects) {
+    Statement statement = writer_.Prepare(std::string(kSelectRow) +
+                                          "WHERE id IN (SELECT id FROM suspects) AND path > ?1 ORDER BY path LIMIT ?2");
+    statement.Bind(1, std::string_view(request.after)).Bind(2, request.limit);
+    while (statement.Step()) take(LoadEntry(ReadRow(statement), request.fields));
     return;
   }
   Statement statement = writer_.Prepare(sql);

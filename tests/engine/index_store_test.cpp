@@ -35,6 +35,47 @@ class IndexStoreTest : public testing::Test {
   std::unique_ptr<IndexStore> store_;
 };
 
+TEST_F(IndexStoreTest, OtherNamesOfAChangedFileAreSuspects) {
+  const auto stamped = [](const std::string& path, const std::string& stamp) {
+    Json::Value document = FileDocument(path, "text");
+    document["_KOVAStamp"] = stamp;
+    return document;
+  };
+  const auto suspects = [this] {
+    GetRequest request;
+    request.suspects = true;
+    return List(request);
+  };
+  for (const char* name : {"/a", "/b", "/c"}) Put(stamped(name, "1.1.1.77"));
+  Put(stamped("/other", "1.1.1.78"));
+  Put(stamped("/unknown", "77"));
+  Json::Value folder = stamped("/folder", "1.1.1.77");
+  folder["KOVAMDIsDir"] = true;
+  Put(folder);
+  EXPECT_EQ("", suspects());
+  Put(stamped("/b", "1.1.2.77"));
+  EXPECT_EQ("/a|/c|", suspects());
+  Put(stamped("/a", "1.1.2.77"));
+  store_->Commit();
+  Reopen();
+  EXPECT_EQ("/c|", suspects());
+  Json::Value change;
+  change["_KOVAStamp"] = "1.1.2.77";
+  store_->Set("/c", change);
+  EXPECT_EQ("", suspects());
+  change = Json::Value();
+  change["KOVAMDPath"] = "/moved";
+  store_->Set("/c", change);
+  EXPECT_EQ("", suspects()) << "a name alone says nothing of the file";
+  store_->Delete("/moved");
+  EXPECT_EQ("/a|/b|", suspects());
+  Put(stamped("/a", "1.1.1.79"));
+  EXPECT_EQ("/b|", suspects());
+  store_->Delete("/b");
+  Put(stamped("/new", "1.1.1.77"));
+  EXPECT_EQ("", suspects());
+}
+
 TEST_F(IndexStoreTest, DocumentsAreFoundByAllTheirParts) {
   Json::Value document =
       FileDocument("/v/s/Annual Report_2024.PDF", "Der Straßenbau in Łódź: quick brown fox. v2東京都の話");

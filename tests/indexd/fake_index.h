@@ -42,19 +42,23 @@ class FakeIndex : public indexd::ShareIndex {
     const std::lock_guard lock(mutex);
     if (before_write) before_write(path);
     ++upserts[path];
+    Changed(path, document.stamp);
     documents[path] = document;
   }
 
   void Attr(const std::string& path) override {
     const std::string stamp = StampOf(path);
     const std::lock_guard lock(mutex);
-    RequireDocument(path).stamp = stamp;
+    (void)RequireDocument(path);
+    Changed(path, stamp);
+    documents[path].stamp = stamp;
   }
 
   void Delete(const std::vector<std::string>& paths, bool and_below) override {
     for (const std::string& path : paths) {
       if (and_below) DeleteBelow(path);
       const std::lock_guard lock(mutex);
+      Changed(path, "");
       documents.erase(path);
     }
   }
@@ -97,12 +101,22 @@ class FakeIndex : public indexd::ShareIndex {
     return {{path, found->second.stamp, found->second.with_content}};
   }
 
+  std::vector<indexd::IndexedEntry> Suspects(const std::string& after, unsigned limit) override {
+    const std::lock_guard lock(mutex);
+    std::vector<indexd::IndexedEntry> page;
+    for (auto at = suspects.upper_bound(after); at != suspects.end() && page.size() < limit; ++at) {
+      if (documents.count(*at) != 0) page.push_back({*at, documents[*at].stamp, documents[*at].with_content});
+    }
+    return page;
+  }
+
   Json::Value Figures() override { return Json::Value(); }
 
   std::mutex mutex;
   bool exists = true;
   std::atomic<bool> paused{false};
   std::map<std::string, Document> documents;
+  std::set<std::string> suspects;
   std::map<std::string, int> upserts;
   int creations = 0;
   int renames = 0;
@@ -121,6 +135,16 @@ class FakeIndex : public indexd::ShareIndex {
     std::string content;
     (void)ReadWholeFile(path, content);
     return content;
+  }
+
+  /// Before the document at `path` gets another stamp, or ("") is removed.
+  void Changed(const std::string& path, const std::string& stamp) {
+    suspects.erase(path);
+    const std::string before = documents.count(path) != 0 ? documents[path].stamp : stamp;
+    for (const auto& [other, document] : documents) {
+      const bool linked = KOVA::CONTENT_EXTRACT::SameFile(document.stamp, stamp.empty() ? before : stamp);
+      if (other != path && linked && document.stamp != stamp) suspects.insert(other);
+    }
   }
 
   Document& RequireDocument(const std::string& path) {

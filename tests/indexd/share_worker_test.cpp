@@ -46,6 +46,34 @@ TEST_F(ShareWorkerTest, CopiedTreeIsComparedOnce) {
   EXPECT_LE(index->lists, 2);
 }
 
+TEST_F(ShareWorkerTest, ChangeUnderOneNameReachesTheOthers) {
+  test::WriteFile(At("a"), "1");
+  fs::create_directory(At("d"));
+  Process(Line(kReindex, root));
+  const auto expect_current = [this] {
+    EXPECT_EQ(Expected(), Indexed());
+    for (const auto& [path, document] : index->documents) {
+      struct stat status = {};
+      ASSERT_EQ(0, lstat(path.c_str(), &status));
+      EXPECT_EQ(KOVA::CONTENT_EXTRACT::Stamp(status), document.stamp) << path;
+    }
+  };
+  fs::create_hard_link(At("a"), At("b"));
+  fs::create_hard_link(At("a"), At("c"));
+  test::WriteFile(At("c"), "2");
+  Process(Line(kCreate, At("b")) + Line(kCreate, At("c")));
+  expect_current();
+  test::WriteFile(At("b"), "3");
+  Process(Line(kModify, At("b")));
+  expect_current();
+  fs::permissions(At("b"), fs::perms::owner_read);
+  Process(Line(kAttr, At("b")));
+  expect_current();
+  fs::remove(At("b"));
+  Process(Line(kDelete, At("b")));
+  expect_current();
+}
+
 TEST_F(ShareWorkerTest, WhatIsNotIndexedIsTakenOut) {
   fs::create_symlink("/etc/passwd", At("x"));
   fs::create_directory_symlink(folder.Path(), At("link"));
