@@ -42,10 +42,10 @@ struct Group {
 Group GroupOf(const std::vector<Place>& places, size_t begin, size_t end) {
   const std::string& first = places[begin].path;
   if (end - begin == 1) return {begin, end, first.size(), {}};
-  // What the first and the last have in common, all have.
+  // What the first and the last have in common, all have. They differ behind the slash of the folder's last name.
   const std::string& last = places[end - 1].path;
   const auto differs = std::mismatch(first.begin(), first.end(), last.begin(), last.end()).first;
-  Group group = {begin, end, first.rfind('/', static_cast<size_t>(differs - first.begin())), {}};
+  Group group = {begin, end, first.rfind('/', static_cast<size_t>(differs - first.begin()) - 1), {}};
   const auto name_of = [&](size_t i) {
     const std::string_view below = std::string_view(places[i].path).substr(group.folder_size + 1);
     return below.substr(0, below.find('/'));

@@ -5,6 +5,7 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <cstdint>
 #include <utility>
 
 #include "common/clock.h"
@@ -20,6 +21,7 @@ using std::chrono::milliseconds;
 
 constexpr milliseconds kFirstPause{100};
 constexpr milliseconds kLongestPause{5000};
+constexpr milliseconds kTellingPause{1600};
 constexpr size_t kBytesAtOnce = 1U << 20;
 constexpr char kLockHeld[] = "its lock is held elsewhere";
 constexpr int kLockAttempts = 20;
@@ -52,17 +54,18 @@ std::string HeldQueue::FlushAll(TimePoint now) {
   return reason;
 }
 
-/// Takes note of how an attempt went, "" for well, and says in the log when that changes.
+/// Takes note of how an attempt went, "" for well. What lasts is told in the log, once, and so is its end.
 void HeldQueue::Hold(std::string reason, TimePoint now) {
   if (reason.empty()) {
-    if (pause_ > kFirstPause) Log(LOG_INFO, "queue %s takes changes again", path_.c_str());
+    if (pause_ >= kTellingPause) Log(LOG_NOTICE, "queue %s takes changes again", path_.c_str());
     pause_ = milliseconds(0);
     next_attempt_ = TimePoint::min();
   } else {
+    const bool was_told = pause_ >= kTellingPause;
     pause_ = std::clamp(2 * pause_, kFirstPause, kLongestPause);
     next_attempt_ = now + pause_;
-    if (reason != reason_ && reason != kLockHeld) {
-      Log(LOG_WARNING, "queue %s: changes are held: %s", path_.c_str(), reason.c_str());
+    if (!was_told && pause_ >= kTellingPause) {
+      Log(LOG_WARNING, "queue %s: changes are held in memory: %s", path_.c_str(), reason.c_str());
     }
   }
   reason_ = std::move(reason);

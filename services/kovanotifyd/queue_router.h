@@ -32,7 +32,7 @@ struct QueueFigures {
 /// or at the latest after a few seconds, and not for each write. Changes of one path that wait together are one.
 /// Lines that cannot be appended (full disk, lock held elsewhere, a queue that nobody empties) are kept in memory in
 /// few words: what grows beyond a bound becomes the comparison of a folder. Belongs to one thread. Nothing here blocks
-/// longer than a write.
+/// longer than a write, but FlushAll.
 class QueueRouter {
  public:
   using TimePoint = std::chrono::steady_clock::time_point;
@@ -62,8 +62,8 @@ class QueueRouter {
 
   /// Appends what is due. Returns when something else will be, or TimePoint::max().
   TimePoint Flush(TimePoint now);
-  /// Appends all, also of files that are still being written to. "", or a sentence that says which queue could not take
-  /// everything and why.
+  /// Appends all, also of files that are still being written to; waits up to 0.1 s for each queue's lock. "", or a
+  /// sentence that says which queue could not take everything and why.
   std::string FlushAll(TimePoint now);
 
   /// By the queue's path.
