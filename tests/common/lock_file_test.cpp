@@ -5,6 +5,7 @@
 #include <sys/syscall.h>
 #include <unistd.h>
 
+#include <cerrno>
 #include <utility>
 
 #include "common/mutex.h"
@@ -70,6 +71,23 @@ TEST_F(LockFileTest, ALockOnAFileThatWasRenamedAwayDoesNotCount) {
   EXPECT_EQ(InodeOf("/proc/self/fd/" + std::to_string(lock.Descriptor())), InodeOf(queue));
   EXPECT_TRUE(clock_.sleeps.empty()) << "there is nothing to wait for";
   EXPECT_EQ(Failure("queue.tmp"), "") << "the detached file is not locked";
+}
+
+TEST_F(LockFileTest, CanBeTriedOnce) {
+  const std::string queue = dir_ / "queue";
+  test::WriteFile(queue, "line\n");
+  {
+    g_before_flock = [&] { std::filesystem::rename(queue, queue + ".tmp"); };
+    const auto lock = LockFile::Try(queue, true);
+    ASSERT_NE(lock, nullptr);
+    EXPECT_EQ(InodeOf("/proc/self/fd/" + std::to_string(lock->Descriptor())), InodeOf(queue));
+    EXPECT_EQ(LockFile::Try(queue, false), nullptr);
+    EXPECT_EQ(errno, EWOULDBLOCK);
+  }
+  EXPECT_NE(LockFile::Try(queue, true), nullptr);
+  EXPECT_EQ(LockFile::Try(dir_.Path(), true), nullptr);
+  EXPECT_EQ(errno, EINVAL);
+  EXPECT_TRUE(clock_.sleeps.empty());
 }
 
 TEST(MutexTest, Excludes) {
