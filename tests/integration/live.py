@@ -3,6 +3,7 @@
 import json
 import os
 import stat
+import time
 
 from instance import TIMEOUT, Instance, differences, write
 
@@ -40,12 +41,17 @@ class LiveInstance(Instance):
         return {watch["path"]: watch for queue in self.notifyd()["queues"] for watch in queue["watches"]}
 
     def sync(self):
-        """All changes up to now are in the index when it returns; returns what the daemons say against that."""
+        """All changes up to now are in the index when it returns; returns what the daemons say against that. A daemon
+        that has lost another one meanwhile says so, and may be asked again."""
         problems = self.notifyd("sync", timeout_ms=self.sync_seconds * 1000)["problems"]
         data = {"shares": list(self.shares), "timeout_ms": self.sync_seconds * 1000}
-        reply = self.ask("fileindexd", {"type": "sync", "data": data}, b"\0", self.sync_seconds)
-        assert reply["success"], (reply, problems)
-        return problems
+        end = time.monotonic() + self.sync_seconds
+        while True:
+            reply = self.ask("fileindexd", {"type": "sync", "data": data}, b"\0", self.sync_seconds)
+            if reply["success"]:
+                return problems
+            assert time.monotonic() < end, (reply, problems)
+            time.sleep(0.1)
 
     def indexed(self, share):
         """Of each document of the share below its folder, by path, what the index says of it."""

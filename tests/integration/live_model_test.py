@@ -6,6 +6,7 @@ FERROX_OPERATIONS=100000 FERROX_SEED=7 FERROX_BIN=build/release/bin python3 -B t
 
 import collections
 import errno
+import itertools
 import os
 import random
 import shutil
@@ -145,12 +146,13 @@ class World:
     def move(self, old, new):
         if not old or not new or self.would_take_a_link_out(old, new):
             return False
-        self.note("rename", old, new)
         try:
             os.rename(old, new)
+            self.note("rename", old, new)
         except OSError as error:
             if error.errno != errno.EXDEV or os.path.lexists(new):
                 raise
+            self.note("copy and remove", old, new)
             shutil.move(old, new)
         return True
 
@@ -169,8 +171,8 @@ class World:
     def link(self):
         old, new = self.file(), self.new_path()
         if old and not self.is_outside(old) and not self.is_outside(new):
-            self.note("link", old, new)
             os.link(old, new)
+            self.note("link", old, new)
 
     def symlink(self):
         path = self.new_path()
@@ -190,7 +192,17 @@ class World:
             shutil.rmtree(path)
 
     def note(self, *words):
-        self.log.append(f"{time.monotonic():.3f} " + " ".join(repr(word) for word in words))
+        self.log.append((time.monotonic(), *words))
+
+    def history(self, path):
+        """What happened to the path, and to what it was called before, the last first."""
+        for entry in reversed(self.log):
+            _, what, *paths = entry
+            touched = [other for other in paths if is_at_or_below(path, other)]
+            if touched or not paths or what in ("kill", "watch by"):
+                yield entry
+            if what in ("rename", "copy and remove") and is_at_or_below(path, paths[1]):
+                path = paths[0] + path[len(paths[1]):]
 
     WEIGHTS = {write: 22, append: 8, truncate: 4, change_attributes: 6, make_folder: 10, rename_file: 14,
                rename_folder: 14, rename_often: 3, replace: 5, link: 4, symlink: 2, delete: 8, remove_folder: 3}
@@ -266,13 +278,15 @@ class World:
         lines = [f"the daemons say: {problems}", f"notification daemon: {self.instance.notifyd()}"]
         for path, (expected, indexed) in sorted(found.items())[:20]:
             lines.append(f"{path!r}\n  disk  {expected}\n  index {indexed}")
-            name = repr(os.path.basename(path))[1:-1]
-            lines += ["    " + line for line in self.log if name in line or "'stop'" in line or "'kill'" in line or
-                      "'continue'" in line or "'sync'" in line][-25:]
+            lines += [f"    {at:.3f} {words}" for at, *words in itertools.islice(self.history(path), 25)]
         time.sleep(2)
         later = self.instance.differences()
         lines.append(f"{len(found)} paths differ, {len(later)} two seconds later")
         return "\n".join(lines)
+
+
+def is_at_or_below(path, folder):
+    return path == folder or path.startswith(folder + "/")
 
 
 class LiveModelTest(unittest.TestCase):
