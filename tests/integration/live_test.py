@@ -143,6 +143,15 @@ class Changes:
         shutil.rmtree(f"{self.docs}/turn2")
         write(f"{self.docs}/turn2", "file")
 
+    def step_folder_made_and_moved_with_its_parent(self):
+        os.makedirs(f"{self.docs}/parent/child")
+        os.rename(f"{self.docs}/again", f"{self.docs}/parent/grown")
+        os.rename(f"{self.docs}/parent", f"{self.docs}/moved")
+
+    def step_write_into_what_was_made_and_moved(self):
+        write(f"{self.docs}/moved/child/x.txt", "in a new place")
+        write(f"{self.docs}/moved/grown/0/x.txt", "in an old place")
+
     def step_symlinks(self):
         os.symlink("/etc", f"{self.docs}/link")
         os.symlink(f"{self.docs}/full", f"{self.docs}/full2")
