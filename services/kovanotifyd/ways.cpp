@@ -9,6 +9,7 @@
 #include "services/kovanotifyd/filesystem_watcher.h"
 #include "services/kovanotifyd/folder_watcher.h"
 #include "services/kovanotifyd/inotify_port.h"
+#include "services/support/daemon.h"
 
 namespace ferrox::notifyd {
 
@@ -81,6 +82,7 @@ std::vector<std::string> OwnPaths() {
   std::vector<std::string> paths;
   for (const char* folder : {"/var/lib/kova", "/var/log/kova", kConfigurationFolder, "/var/run"}) {
     const std::string path = InstancePath(folder);
+    (void)services::MakeFolders(path);
     const std::string real = RealPath(path);
     paths.push_back((real.empty() ? path : real) + "/");
   }
