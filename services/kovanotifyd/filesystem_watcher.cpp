@@ -231,6 +231,7 @@ void FilesystemWatcher::TakeName(const FanRecord& record, WatchListener& listene
   }
   if (is_in_quiet && (mask & kQuietMask) != 0) Silence(record);
   if (paths_.empty()) return;
+  history_.NoteName(record.target);
 
   bool is_deleted = (mask & FAN_DELETE) != 0;
   if (is_deleted) {
@@ -277,7 +278,8 @@ void FilesystemWatcher::TakeRename(const FanRecord& record, WatchListener& liste
     }
   }
   // A link that was made at the old place afterwards may have been joined with an earlier record of it.
-  if (record.IsFolder() || paths_.empty() || !mounts_.HasName(record.folder, record.name).value_or(false)) return;
+  if (record.IsFolder() || paths_.empty() || !history_.MayHaveName(record.target)) return;
+  if (!mounts_.HasName(record.folder, record.name).value_or(false)) return;
   for (const std::string& path : paths_) Tell(listener, Kind::kCreated, record, path);
 }
 

@@ -78,13 +78,14 @@ void WaitForChangesUnderWay(int folder) {
 
 std::string MountedFolders::Add(const std::string& path, int folder, const HandleKey& key) {
   const std::string top = TopOfMount(path);
-  const bool is_known = std::any_of(anchors_.begin(), anchors_.end(), [&](const Anchor& anchor) {
-    return anchor.path == top && FanGroup::IsSameFileSystem(anchor.key, key);
+  auto anchor = std::find_if(anchors_.begin(), anchors_.end(), [&](const Anchor& known) {
+    return known.path == top && FanGroup::IsSameFileSystem(known.key, key);
   });
-  if (!is_known) anchors_.push_back({top, key});
+  if (anchor == anchors_.end()) anchor = anchors_.insert(anchor, Anchor{top, key});
+  if (!IsOpen(*anchor)) return "its mount cannot be opened";
   struct stat there = {};
   struct stat reached = {};
-  const UniqueFd again = Open(key, O_PATH | O_DIRECTORY);
+  const UniqueFd again = FanGroup::OpenKey(key, anchor->fd.Get(), O_PATH | O_DIRECTORY);
   if (!again.Valid() && errno == EPERM) return "opening folders by handle needs the capability CAP_DAC_READ_SEARCH";
   if (!again.Valid()) return "the file system does not open folders by handle: " + std::string(strerror(errno));
   if (fstat(folder, &there) != 0 || fstat(again.Get(), &reached) != 0 || there.st_dev != reached.st_dev ||

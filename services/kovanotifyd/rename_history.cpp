@@ -34,6 +34,11 @@ void RenameHistory::Note(const FanRecord& record) {
   NoteLeft(record.target, std::move(left));
 }
 
+void RenameHistory::NoteName(const HandleKey& target) {
+  names_.set(std::hash<HandleKey>()(target) % kNameBits);
+  has_names_ = true;
+}
+
 bool RenameHistory::HasLeft(const HandleKey& target) const {
   return left_.count(target) != 0 || left_before_.count(target) != 0;
 }
@@ -71,6 +76,7 @@ void RenameHistory::Clear() {
   left_before_ = {};
   looping_ = {};
   noted_ = 0;
+  if (std::exchange(has_names_, false)) names_.reset();
 }
 
 }  // namespace ferrox::notifyd

@@ -1,6 +1,8 @@
 #pragma once
 
+#include <bitset>
 #include <cstddef>
+#include <functional>
 #include <string>
 #include <unordered_map>
 #include <unordered_set>
@@ -18,6 +20,10 @@ class RenameHistory {
  public:
   /// Whether a name of the file was noted: a name that it is found to have now may be missing from the records.
   bool HasLeft(const HandleKey& target) const;
+  /// Notes that a record told of a name of the file. A link made there later may be joined with it.
+  void NoteName(const HandleKey& target);
+  /// Whether a name of the file may have been noted.
+  bool MayHaveName(const HandleKey& target) const { return names_[std::hash<HandleKey>()(target) % kNameBits]; }
   /// Notes a record that renames or removes a name.
   void Note(const FanRecord& record);
   bool HasLoops() const { return !looping_.empty(); }
@@ -32,6 +38,9 @@ class RenameHistory {
   /// As many records can wait in the kernel, unless fs.fanotify.max_queued_events says otherwise.
   static constexpr size_t kGenerationMax = 16384;
 
+  /// Eight a record: what is noted is known for certain, what is not is mostly not taken for it.
+  static constexpr size_t kNameBits = 8 * kGenerationMax;
+
   bool WasAt(const HandleKey& target, const std::string& place) const;
   void NoteLeft(const HandleKey& target, std::string place);
 
@@ -39,6 +48,8 @@ class RenameHistory {
   std::unordered_map<HandleKey, Places> left_before_;
   size_t noted_ = 0;
   std::unordered_set<HandleKey> looping_;
+  std::bitset<kNameBits> names_;
+  bool has_names_ = false;
 };
 
 }  // namespace ferrox::notifyd
