@@ -51,7 +51,8 @@ OperationRunner::OperationRunner(const PassContext& context)
       mover_(context_.root, context.index, context.folders, rules_, writer_, context.interruption),
       tasks_(context.pool, context.interruption),
       gone_trees_(tasks_, writer_, true),
-      gone_(tasks_, writer_, false) {}
+      gone_(tasks_, writer_, false),
+      tail_(context_.queue_path) {}
 
 void OperationRunner::Run(const std::function<void(const std::function<void(const fileindex::OP&)>&)>& each,
                           const std::vector<std::string>& also_compare) {
@@ -63,6 +64,7 @@ void OperationRunner::Run(const std::function<void(const std::function<void(cons
   tasks_.Wait();
   each([this](const fileindex::OP& op) {
     CarryOut(op, Stage::kLook);
+    KeepUp();
     context_.status.OperationDone();
   });
   for (const std::string& path : also_compare) CompareOnce(path);
@@ -105,6 +107,25 @@ void OperationRunner::CheckRoot() const {
 void OperationRunner::CommitIfDue() {
   if (!writer_.HasUncommitted() || std::chrono::steady_clock::now() - last_commit_ < kCommitInterval) return;
   Commit();
+}
+
+/// While a long pass goes on, files that change meanwhile are written, too, so that they are found soon. Only that:
+/// their lines stay in the queue, whose pass carries them out again in its turn and decides, so that it does not matter
+/// what the present pass knew of these files.
+void OperationRunner::KeepUp() {
+  if (std::chrono::steady_clock::now() - kept_up_ < context_.keep_up_interval) return;
+  struct stat status = {};
+  bool any = false;
+  for (const std::string& path : tail_.NextChangedFiles()) {
+    if (LookAt(path, status) != Presence::kThere || !rules_.CanBeIndexed(path)) continue;
+    tasks_.Submit([this, path] { writer_.Write(path); });
+    any = true;
+  }
+  if (any) {
+    tasks_.Wait();
+    Commit();
+  }
+  kept_up_ = std::chrono::steady_clock::now();
 }
 
 void OperationRunner::Commit() {
@@ -298,6 +319,7 @@ ComparisonActions OperationRunner::Actions(const std::string& folder) {
     if (++examined == kFilesBeforeCount)
       *count = std::make_unique<FileCount>(folder, context_.folders, context_.status);
     CommitIfDue();
+    KeepUp();
   };
   return actions;
 }

@@ -14,6 +14,7 @@
 #include "services/fileindexd/document_writer.h"
 #include "services/fileindexd/interruption.h"
 #include "services/fileindexd/path_rules.h"
+#include "services/fileindexd/queue_tail.h"
 #include "services/fileindexd/removal_batch.h"
 #include "services/fileindexd/share_folders.h"
 #include "services/fileindexd/share_index.h"
@@ -33,6 +34,8 @@ struct PassContext {
   const Interruption& interruption;
   ShareStatus& status;
   const HeldFolder& held;  ///< the share's folder
+  const std::string& queue_path;
+  std::chrono::milliseconds keep_up_interval;
 };
 
 /// Carries the operations of one pass into the index, in two stages: first what removes and moves documents, in the
@@ -78,6 +81,7 @@ class OperationRunner {
 
   void CarryOut(const fileindex::OP& op, Stage stage);
   void CommitIfDue();
+  void KeepUp();
   void Commit();
 
   bool BecameReadable(const std::string& folder);
@@ -99,9 +103,11 @@ class OperationRunner {
   TaskGroup tasks_;
   RemovalBatch gone_trees_;
   RemovalBatch gone_;
+  QueueTail tail_;
   std::set<std::string> compared_;
   bool had_reindex_ = false;
   std::chrono::steady_clock::time_point last_commit_ = std::chrono::steady_clock::now();
+  std::chrono::steady_clock::time_point kept_up_ = std::chrono::steady_clock::now();
 };
 
 }  // namespace ferrox::indexd

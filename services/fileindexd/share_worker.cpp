@@ -400,7 +400,8 @@ void ShareWorker::RunPass() {
   if (!queue.PrepareTmpQueue() && !IsFileExist(queue_path_ + ".tmp")) return;
   // Only now: of folders that are changed later, the events are in a later queue.
   const ShareFolders folders = LoadFolders();
-  OperationRunner runner({share_, root_, folders, *index_, environment_.pool, interruption_, status_, held});
+  OperationRunner runner({share_, root_, folders, *index_, environment_.pool, interruption_, status_, held, queue_path_,
+                          environment_.keep_up_interval});
   RunOperations(queue, runner, folders);
   // What went away in the meantime, with its volume for example, looked as if it had been deleted.
   runner.CheckRoot();

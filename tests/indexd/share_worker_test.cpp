@@ -1,5 +1,7 @@
 #include "services/fileindexd/share_worker.h"
 
+#include <algorithm>
+
 #include "tests/indexd/worker_test.h"
 
 namespace ferrox::indexd {
@@ -44,6 +46,27 @@ TEST_F(ShareWorkerTest, CopiedTreeIsComparedOnce) {
   Process(lines);
   EXPECT_EQ(Expected(), Indexed());
   EXPECT_LE(index->lists, 2);
+}
+
+TEST_F(ShareWorkerTest, FilesThatChangeDuringALongPassAreWrittenInIt) {
+  keep_up_interval = std::chrono::milliseconds(0);
+  worker = MakeWorker();
+  for (int i = 0; i < 300; ++i) test::WriteFile(At("f" + std::to_string(i)), "x");
+  std::vector<std::string> written;
+  index->before_write = [this, &written](const std::string& path) {
+    written.push_back(fs::path(path).filename());
+    if (written.size() != 20) return;
+    test::WriteFile(At("aa"), "new");
+    test::WriteFile(At("f5"), "changed");
+    Queue("not json\n" + Line(kCreate, At("aa")) + Line(kModify, At("f5")) + Line(kModify, At("gone")) +
+          Line(kCreate, "/elsewhere") + Line(kDelete, At("f7")) + "{\"event\":2,\"path\":\"" + At("f9"));
+  };
+  fs::remove(queue_path);
+  Queue(Line(kReindex, root));
+  worker->RunOnce();
+  EXPECT_LT(std::find(written.begin(), written.end(), "aa") - written.begin(), 200);
+  EXPECT_EQ(Expected(), Indexed());
+  EXPECT_EQ(2, index->upserts[At("aa")]) << "and again in their turn";
 }
 
 TEST_F(ShareWorkerTest, ChangeUnderOneNameReachesTheOthers) {

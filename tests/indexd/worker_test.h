@@ -81,6 +81,7 @@ class WorkerTest : public testing::Test {
                                          }};
     environment.gather_time = std::chrono::milliseconds(0);
     environment.patience = patience;
+    environment.keep_up_interval = keep_up_interval;
     environment.is_mount_point = is_mount_point;
     environment.volume_poll = std::chrono::milliseconds(20);
     return std::make_unique<ShareWorker>(share, environment);
@@ -147,6 +148,7 @@ class WorkerTest : public testing::Test {
   TaskPool pool{2};
   PauseState pause;
   std::chrono::milliseconds patience{0};
+  std::chrono::milliseconds keep_up_interval{3600 * 1000};
   IsMountPoint is_mount_point = &NothingMounted;
   std::string share, root, queue_path;
   Folders configured;
