@@ -6,9 +6,10 @@
 //   Unpack     a file is created, written twice and closed: four changes, one line
 //   Replace    a file is created beside, written, closed and renamed over its old version: two lines
 //   RemoveTree files of 100 folders are deleted, each folder after its 1,000 files
-//   Held       as Burst, but the queue cannot be appended to: changes become comparisons
+//   Moves      folders are made, filled, renamed and removed
 //
-// ManyFolders watches 1,000 folders for each of 10 queues; the others watch one.
+// OneFolder watches one folder for one queue, ManyFolders 1,000 for each of 10. Held has a queue that cannot be
+// appended to, so that changes become comparisons.
 
 #include <stdlib.h>
 
@@ -50,6 +51,16 @@ Change RemoveTree(int64_t i) {
   const int64_t folder = i / 1001 % 100;
   return i % 1001 == 1000 ? Change{Kind::kDeleted, true, Folder(folder)}
                           : Change{Kind::kDeleted, false, File(folder, i)};
+}
+
+Change Moves(int64_t i) {
+  const std::string folder = Folder(i / 5 % 300) + "/" + std::to_string(i / 5);
+  const Change kChanges[] = {{Kind::kCreated, true, folder},
+                             {Kind::kCreated, false, folder + "/file"},
+                             {Kind::kRenamed, true, folder + ".new", folder},
+                             {Kind::kDeleted, false, folder + ".new/file"},
+                             {Kind::kDeleted, true, folder + ".new"}};
+  return kChanges[i % 5];
 }
 
 using Queues = std::map<std::string, std::vector<QueueWatch>>;
@@ -95,6 +106,7 @@ BENCHMARK_CAPTURE(OneFolder, Burst, Burst);
 BENCHMARK_CAPTURE(OneFolder, Unpack, Unpack);
 BENCHMARK_CAPTURE(OneFolder, Replace, Replace);
 BENCHMARK_CAPTURE(OneFolder, RemoveTree, RemoveTree);
+BENCHMARK_CAPTURE(OneFolder, Moves, Moves);
 
 void ManyFolders(benchmark::State& state) {
   const QueueFolder folder;
@@ -107,11 +119,12 @@ void ManyFolders(benchmark::State& state) {
 }
 BENCHMARK(ManyFolders);
 
-void Held(benchmark::State& state) {
+void Held(benchmark::State& state, Change (*change_of)(int64_t)) {
   const QueueFolder folder;
-  Run(state, {{folder.Queue("missing/queue"), {{"/volume1/photo", 0xFFC6, {"@eaDir"}}}}}, Burst);
+  Run(state, {{folder.Queue("missing/queue"), {{"/volume1/photo", 0xFFC6, {"@eaDir"}}}}}, change_of);
 }
-BENCHMARK(Held);
+BENCHMARK_CAPTURE(Held, Burst, Burst);
+BENCHMARK_CAPTURE(Held, Moves, Moves);
 
 }  // namespace
 
