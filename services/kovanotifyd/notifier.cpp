@@ -168,7 +168,8 @@ void Notifier::BeginSync() {
   watches_.Scan();
   syncs_.Begin();
   for (size_t way = 0; way < watches_.Ways(); ++way) {
-    if (!watches_.IsUsed(way)) continue;
+    // A folder that is still being set up is compared when it is covered, which says all.
+    if (!watches_.IsCovering(way)) continue;
     if (options_.cookies[way].Touch()) {
       syncs_.Touched(way);
     } else {
@@ -179,7 +180,11 @@ void Notifier::BeginSync() {
 }
 
 void Notifier::ContinueSync() {
-  if (!syncs_.Outstanding().empty() || watches_.IsSettingUp()) return;
+  if (watches_.IsSettingUp()) return;
+  for (const size_t way : syncs_.Outstanding()) {
+    if (!watches_.IsCovering(way)) syncs_.Reported(way);  // it watches nothing any more
+  }
+  if (!syncs_.Outstanding().empty()) return;
   const std::string held = router_.FlushAll(SteadyClock::now());
   if (!held.empty()) sync_problems_.push_back(held);
   for (const std::string& problem : watches_.Problems()) sync_problems_.push_back(problem);

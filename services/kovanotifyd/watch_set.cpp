@@ -233,9 +233,9 @@ bool WatchSet::IsScanned(const Root& root) const {
   return root.state == Root::State::kCovered && root.way == ways_.size();
 }
 
-bool WatchSet::IsUsed(size_t way) const {
+bool WatchSet::IsCovering(size_t way) const {
   return std::any_of(roots_.begin(), roots_.end(), [way](const auto& entry) {
-    return entry.second.state != Root::State::kWaiting && entry.second.way == way;
+    return entry.second.state == Root::State::kCovered && entry.second.way == way;
   });
 }
 

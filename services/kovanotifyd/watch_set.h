@@ -73,8 +73,8 @@ class WatchSet {
   const std::string& NameOf(size_t way) const { return ways_[way].name; }
   /// Readable when Read has something to do; -1: never.
   int FdOf(size_t way) const { return ways_[way].watcher != nullptr ? ways_[way].watcher->Fd() : -1; }
-  /// Whether a folder is watched that way.
-  bool IsUsed(size_t way) const;
+  /// Whether a folder is watched that way, already covered.
+  bool IsCovering(size_t way) const;
   /// Takes what has happened; false when that was not yet all.
   bool Read(size_t way);
   /// Goes on with what takes time, for about `at_most`; false when nothing is left to do.

@@ -49,6 +49,12 @@ class NotifierTest : public testing::Test {
     notifier_ = std::make_unique<Notifier>(std::move(options));
     thread_ = std::thread([this] { notifier_->Run(stop_.Get()); });
   }
+  /// Started, and its first folder covered and compared.
+  void StartCovered() {
+    Start();
+    WaitFor([this] { return notifier_->Status().queues[0].figures.written == 1; });
+    (void)Lines();
+  }
   void Stop() {
     (void)eventfd_write(stop_.Get(), 1);
     if (thread_.joinable()) thread_.join();
@@ -118,36 +124,31 @@ TEST_F(NotifierTest, AfterASyncAllThatHappenedBeforeIsInTheQueue) {
 }
 
 TEST_F(NotifierTest, WithoutASyncChangesArriveByThemselves) {
-  Start();
-  (void)notifier_->Sync(seconds(60));
-  (void)Lines();
+  StartCovered();
   fake_->Say(Created(folder_ + "/a"));
   WaitFor([this] { return fs::exists(queue_) && fs::file_size(queue_) > 0; });
   EXPECT_EQ(Lines(), "40 /folder/a ");
 }
 
 TEST_F(NotifierTest, SyncsThatComeMeanwhileShareTheNextRound) {
-  Start();
-  (void)notifier_->Sync(seconds(60));
+  StartCovered();
   fake_->HoldCookies(true);
   std::vector<std::thread> threads;
   threads.emplace_back([this] { (void)notifier_->Sync(seconds(60)); });
-  WaitFor([this] { return fake_->Touches() == 2; });
+  WaitFor([this] { return fake_->Touches() == 1; });
   for (int i = 0; i < 10; ++i) threads.emplace_back([this] { (void)notifier_->Sync(seconds(60)); });
   EXPECT_EQ(SyncProblem(milliseconds(50)), "changes are still being read (fake)");
-  EXPECT_EQ(fake_->Touches(), 2) << "never again before it was reported";
+  EXPECT_EQ(fake_->Touches(), 1) << "never again before it was reported";
   fake_->HoldCookies(false);
   for (std::thread& thread : threads) thread.join();
-  EXPECT_EQ(fake_->Touches(), 3);
+  EXPECT_EQ(fake_->Touches(), 2);
 }
 
 TEST_F(NotifierTest, ACookieLostWithOtherChangesDoesNotKeepASyncForEver) {
-  Start();
-  (void)notifier_->Sync(seconds(60));
-  (void)Lines();
+  StartCovered();
   fake_->HoldCookies(true);
   std::thread syncing([this] { (void)notifier_->Sync(seconds(60)); });
-  WaitFor([this] { return fake_->Touches() == 2; });
+  WaitFor([this] { return fake_->Touches() == 1; });
   fake_->Say([](WatchListener& listener) { listener.OnLost(); });
   fake_->Say([this](WatchListener& listener) { listener.OnCovered(folder_); });
   syncing.join();
@@ -170,6 +171,17 @@ TEST_F(NotifierTest, ARegistrationDoesNotWaitForAnotherFoldersSetUp) {
   fake_->Hold("");
   EXPECT_TRUE(notifier_->Sync(seconds(60)).empty());
   EXPECT_EQ(Lines(), "10000 /folder ");
+}
+
+TEST_F(NotifierTest, AWatcherThatRefusesAllIsNotWaitedFor) {
+  held_ = folder_;
+  Start("is broken");
+  fake_->HoldCookies(true);
+  std::thread syncing([this] { EXPECT_TRUE(notifier_->Sync(seconds(60)).empty()); });
+  EXPECT_EQ(SyncProblem(milliseconds(50)), "folders are still being set up to be watched");
+  fake_->Hold("");
+  syncing.join();
+  EXPECT_EQ(notifier_->Status().queues[0].watches[0].state.way, kPeriodicScan);
 }
 
 TEST_F(NotifierTest, WhatNobodyCanWatchIsComparedAtEachSync) {
@@ -195,13 +207,11 @@ TEST_F(NotifierTest, AWorkingRegistrationDoesNotSufferFromABadOneOrAMissingFolde
 }
 
 TEST_F(NotifierTest, AStopKeepsWhatIsInMemoryAndFailsWhoWaits) {
-  Start();
-  (void)notifier_->Sync(seconds(60));
-  (void)Lines();
+  StartCovered();
   fake_->HoldCookies(true);
   std::string problem;
   std::thread syncing([&] { problem = SyncProblem(seconds(60)); });
-  WaitFor([this] { return fake_->Touches() == 2; });
+  WaitFor([this] { return fake_->Touches() == 1; });
   fake_->Say({Change::Kind::kModified, false, folder_ + "/open"});
   (void)eventfd_write(stop_.Get(), 1);
   thread_.join();
