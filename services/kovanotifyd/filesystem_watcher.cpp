@@ -1,6 +1,7 @@
 #include "services/kovanotifyd/filesystem_watcher.h"
 
 #include <fcntl.h>
+#include <malloc.h>
 #include <sys/stat.h>
 
 #include <algorithm>
@@ -24,6 +25,8 @@ constexpr uint64_t kCookieMask = FAN_ATTRIB | FAN_EVENT_ON_CHILD;
 constexpr uint64_t kQuietMask = FAN_CREATE | FAN_DELETE | FAN_MODIFY | FAN_CLOSE_WRITE;
 // How often Read looks for more before it tells of names in doubt, which it would rather do when nothing is waiting.
 constexpr int kRoundsMax = 16;
+// So many records waiting have taken a megabyte or more.
+constexpr size_t kBurst = 4096;
 
 HandleKey KeyOfPath(FanGroup& group, const std::string& path) {
   const UniqueFd folder(open(path.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
@@ -154,13 +157,14 @@ bool FilesystemWatcher::ReadBatch() {
   FanBatch batch;
   if (!group_.IsOpen() || group_.Read(batch) != 0) return false;
   window_.Add(std::move(batch));
+  if (window_.Size() > kBurst) was_burst_ = true;
   return true;
 }
 
 bool FilesystemWatcher::Read(WatchListener& listener) {
   const ScopeExit close([this] { mounts_.Close(); });
   const bool was_anything = ReadBatch();
-  if (!was_anything) history_.Clear();
+  if (!was_anything) Rest();
   for (int round = 0; !window_.IsEmpty(); ++round) {
     WorkThroughWindow(listener);
     if (!history_.HasLoops()) continue;
@@ -170,6 +174,12 @@ bool FilesystemWatcher::Read(WatchListener& listener) {
     if (!is_more && window_.IsEmpty()) history_.Clear();
   }
   return was_anything;
+}
+
+/// Nothing is waiting: what only a burst takes is given back, since a daemon that has nothing to do is to be small.
+void FilesystemWatcher::Rest() {
+  history_.Clear();
+  if (std::exchange(was_burst_, false)) (void)malloc_trim(0);
 }
 
 void FilesystemWatcher::WorkThroughWindow(WatchListener& listener) {

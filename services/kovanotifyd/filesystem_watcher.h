@@ -57,6 +57,7 @@ class FilesystemWatcher : public Watcher, private FolderSource {
   void Drain(RecordWindow& window) override;
   bool ReadBatch();
   void WorkThroughWindow(WatchListener& listener);
+  void Rest();
   void Settle(WatchListener& listener);
   void Lose(WatchListener& listener);
 
@@ -86,6 +87,7 @@ class FilesystemWatcher : public Watcher, private FolderSource {
   std::string last_names_[2] = {};  ///< but with these
   bool can_ignore_ = true;
   bool is_overrun_ = false;
+  bool was_burst_ = false;
   bool told_unknown_ = false;
   Paths paths_;
   Paths new_paths_;
