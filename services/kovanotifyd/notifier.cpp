@@ -162,9 +162,12 @@ void Notifier::ReadChanges() {
   read_at_ = is_busy ? SteadyClock::now() : TimePoint::max();
 }
 
+/// Once every watcher is set up: one that is not may miss its cookie, or come to refuse what it is used for.
 void Notifier::BeginSync() {
-  sync_problems_.clear();
+  if (watches_.IsSettingUp()) return;
   ReadRegistry();
+  if (watches_.IsSettingUp()) return;
+  sync_problems_.clear();
   watches_.Scan();
   syncs_.Begin();
   for (size_t way = 0; way < watches_.Ways(); ++way) {
