@@ -67,14 +67,13 @@ class World:
         return self.random.choice(entries) if entries else None
 
     def file(self):
-        return self.entry(lambda entry: entry.is_file(follow_symlinks=False) and
-                          not (self.is_outside(entry.path) and entry.stat().st_nlink > 1))
+        return self.entry(lambda entry: entry.is_file(follow_symlinks=False))
 
     def subfolder(self):
         return self.entry(lambda entry: entry.is_dir(follow_symlinks=False))
 
-    def is_outside(self, path):
-        return path.startswith(self.outside + "/")
+    def root_of(self, path):
+        return next(root for root in [*self.roots, self.outside] if is_at_or_below(path, root))
 
     def new_path(self):
         name = self.random.choice(NAMES) if self.random.random() < 0.6 else f"f{self.next()}.txt"
@@ -144,7 +143,7 @@ class World:
                 self.fill(f"{path}/{self.random.choice(NAMES)}", "w")
 
     def move(self, old, new):
-        if not old or not new or self.would_take_a_link_out(old, new):
+        if not old or not new or self.would_part_links(old, new):
             return False
         try:
             os.rename(old, new)
@@ -156,9 +155,9 @@ class World:
             shutil.move(old, new)
         return True
 
-    def would_take_a_link_out(self, old, new):
-        """A change through a name that nobody watches tells nothing of the other names."""
-        if not self.is_outside(new):
+    def would_part_links(self, old, new):
+        """A change through one name is told of the names in the same share, not in others or outside."""
+        if self.root_of(old) == self.root_of(new):
             return False
         files = [old] + [os.path.join(parent, name) for parent, _, names in os.walk(old) for name in names]
         return any(os.lstat(path).st_nlink > 1 for path in files if not os.path.isdir(path))
@@ -170,7 +169,7 @@ class World:
 
     def link(self):
         old, new = self.file(), self.new_path()
-        if old and not self.is_outside(old) and not self.is_outside(new):
+        if old and self.root_of(old) == self.root_of(new):
             os.link(old, new)
             self.note("link", old, new)
 
