@@ -185,7 +185,9 @@ size_t QueueOutbox::Format(size_t first, size_t max_bytes, std::string& text) co
 void QueueOutbox::RemoveFirst(size_t count) {
   lines_.erase(lines_.begin(), lines_.begin() + static_cast<std::ptrdiff_t>(count));
   CloseAll();
-  if (lines_.empty()) limit_ = max_;
+  if (!lines_.empty()) return;
+  limit_ = max_;
+  lines_.shrink_to_fit();  // an idle daemon is small, also after a burst
 }
 
 }  // namespace ferrox::notifyd
