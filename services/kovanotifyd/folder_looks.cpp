@@ -128,6 +128,8 @@ FolderWatcher::Seen FolderWatcher::Unwatchable(Id id, int error, WatchListener& 
   if (gone || unreadable) {
     if (tree_.Get(ref) == kNone || !IsCovered(id)) return Seen::kRefused;
     if (gone) {
+      const bool leads_to_root = tree_.Has(id, FolderTree::kPassage) || tree_.Has(id, FolderTree::kRoot);
+      if (leads_to_root && tree_.Key(id) == 0) return Seen::kGone;  // stays for the root's sake
       // What lies above it may have been moved, with it: that is known when all records have been read.
       doubts_.push_back({tree_.RefOf(tree_.Parent(id)), std::string(tree_.Name(id))});
       RemoveFolder(id, listener);
@@ -196,7 +198,10 @@ void FolderWatcher::CheckPlace(const Place& place, WatchListener& listener) {
   Id child = tree_.Child(parent, place.name);
   if (child == kNone) {
     struct stat status = {};
-    if (lstat(tree_.Path(parent, place.name).c_str(), &status) < 0 || !S_ISDIR(status.st_mode)) return;
+    if (lstat(tree_.Path(parent, place.name).c_str(), &status) < 0 || !S_ISDIR(status.st_mode)) {
+      if (!IsAllRead()) doubts_.push_back(place);  // what lies above it may have been moved just now
+      return;
+    }
     child = tree_.Add(parent, place.name);
   }
   LookAndReport(child, false, listener);

@@ -141,7 +141,8 @@ void FolderWatcher::OnSelf(const FolderRecord& record, WatchListener& listener) 
   if (id == kNone) return;
   if (record.kind == Kind::kSelfGone) tree_.SetKey(id, 0);
   const bool told_by_parent = id != FolderTree::kTop && IsCovered(tree_.Parent(id));
-  if (!told_by_parent) {
+  const bool is_root_gone = record.kind == Kind::kSelfGone && tree_.Has(id, FolderTree::kRoot);
+  if (!told_by_parent || is_root_gone) {
     Disturb(id, listener);
   } else if (record.kind == Kind::kSelfGone) {
     checks_.push_back({tree_.RefOf(id), false});

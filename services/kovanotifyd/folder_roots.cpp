@@ -28,7 +28,7 @@ void FolderWatcher::Remove(const std::string& root) {
   MarkPassages();
   if (!IsCovered(id)) return Prune(id);
   for (const std::string& over : RootsOver(id)) {
-    if (roots_.at(over).ignore != ignore) return checks_.push_back({tree_.RefOf(id), true});
+    if (roots_.at(over).ignore != ignore || tree_.Key(id) == 0) return checks_.push_back({tree_.RefOf(id), true});
   }
 }
 

@@ -69,9 +69,8 @@ class WatcherRecorder : public notifyd::WatchListener {
     return text + " " + Short(change.path) + (change.is_folder ? "/" : "");
   }
   void Compare(const std::string& path) {
-    const std::string below = path + "/";
-    std::erase_if(
-        model, [&](const std::string& known) { return known == path || known.compare(0, below.size(), below) == 0; });
+    model.erase(path);
+    model.erase(model.lower_bound(path + "/"), model.lower_bound(path + "0"));  // "0" follows "/"
     AddAll(path, model);
   }
 
