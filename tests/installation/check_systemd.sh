@@ -27,6 +27,9 @@ if [[ ! -e /srv/docs ]]; then
   fileindexctl share add /srv/docs
   expect active active active
   finds lantern
+  echo lighthouse >/srv/docs/b.txt
+  finds lighthouse
+  fileindexctl status
   systemctl kill -s KILL fileindexd.service
   sleep 3
   expect active active active
