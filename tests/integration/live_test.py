@@ -254,7 +254,8 @@ class LiveTest(unittest.TestCase):
         if os.geteuid() != 0:
             self.skipTest("the other cases are those of an ordinary user")
         cases = ["LiveTest.test_changes_by_inode_marks", "LiveTest.test_changes_by_inotify",
-                 "LiveTest.test_changes_by_periodic_scan", "LiveTest.test_default_way_is_the_best_there_is"]
+                 "LiveTest.test_changes_by_periodic_scan", "LiveTest.test_default_way_is_the_best_there_is",
+                 "LiveTest.test_unreadable_folder_is_watched_again_when_it_can_be_read"]
         with tempfile.TemporaryDirectory() as folder:  # the programs, where such a user can reach them
             os.chmod(folder, 0o755)
             programs = os.environ["FERROX_BIN"]
@@ -494,6 +495,32 @@ class LiveTest(unittest.TestCase):
             self.wait_until_watched(docs)
             self.expect_index_is_disk()
             write(f"{docs}/sub/behind it.txt", f"watched again, {time.time()}")
+            self.expect_index_is_disk()
+
+    def test_unreadable_folder_is_watched_again_when_it_can_be_read(self):
+        docs, = self.up("docs")
+        write(f"{docs}/sub/deep/a.txt", "word")
+        self.expect_index_is_disk()
+        os.chmod(f"{docs}/sub", 0)
+        self.addCleanup(os.chmod, f"{docs}/sub", 0o755)
+        write(f"{docs}/beside.txt", "meanwhile")
+        self.instance.sync()
+        os.chmod(f"{docs}/sub", 0o755)
+        for name in ("b", "c"):
+            write(f"{docs}/sub/deep/{name}.txt", name)
+            self.expect_index_is_disk()
+
+    def test_folder_is_covered_by_a_mount_and_uncovered(self):
+        docs, = self.up("docs")
+        write(f"{docs}/sub/deep/a.txt", "word")
+        self.expect_index_is_disk()
+        self.mount("-t", "tmpfs", "none", f"{docs}/sub")
+        write(f"{docs}/sub/other.txt", "on another file system")
+        write(f"{docs}/beside.txt", "meanwhile")
+        self.instance.sync()
+        subprocess.run(["umount", f"{docs}/sub"], check=True)
+        for name in ("b", "c"):
+            write(f"{docs}/sub/deep/{name}.txt", name)
             self.expect_index_is_disk()
 
     def test_indexed_folder_in_a_share_goes_and_comes_back(self):
