@@ -143,7 +143,11 @@ void FilesystemWatcher::FindQuietFolders() {
 }
 
 FolderSource::Answer FilesystemWatcher::ReadPlace(const HandleKey& folder, FolderPlace& place) {
-  return mounts_.ReadPlace(folder, place);
+  const Answer answer = mounts_.ReadPlace(folder, place);
+  const auto removed = answer == Answer::kNowhere ? removed_.find(folder) : removed_.end();
+  if (removed == removed_.end()) return answer;
+  place = removed->second;
+  return Answer::kPlace;
 }
 
 void FilesystemWatcher::Drain(RecordWindow&) {
@@ -179,6 +183,7 @@ bool FilesystemWatcher::Read(WatchListener& listener) {
 /// Nothing is waiting: what only a burst takes is given back, since a daemon that has nothing to do is to be small.
 void FilesystemWatcher::Rest() {
   history_.Clear();
+  removed_.clear();
   if (std::exchange(was_burst_, false)) (void)malloc_trim(0);
 }
 
@@ -237,7 +242,9 @@ void FilesystemWatcher::TakeName(const FanRecord& record, WatchListener& listene
   const uint64_t mask = record.mask;
   const bool is_in_quiet = FindPaths(record.folder, record.name, paths_, listener);
   if ((mask & FAN_CREATE) != 0 && record.IsFolder()) {
-    (void)locator_.Place(record.target, {record.folder, std::string(record.name)});
+    const FolderPlace place = {record.folder, std::string(record.name)};
+    (void)locator_.Place(record.target, place);
+    if ((mask & FAN_DELETE) != 0 && removed_.size() < options_.records_max) removed_[record.target] = place;
   }
   if (is_in_quiet && (mask & kQuietMask) != 0) Silence(record);
   if (paths_.empty()) return;
@@ -271,6 +278,8 @@ void FilesystemWatcher::TakeRename(const FanRecord& record, WatchListener& liste
   if (record.IsFolder()) {
     const FolderPlace place = {record.new_folder, std::string(record.new_name)};
     if (locator_.Place(record.target, place) == nullptr) TellUnknown(record.new_folder, listener);
+    const auto removed = removed_.find(record.target);
+    if (removed != removed_.end()) removed->second = place;
   }
   // The second record of an exchange: what the first one moved here is there now, and was not replaced by this one.
   if (IsExchange(record)) paths_.clear();

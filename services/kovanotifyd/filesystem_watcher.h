@@ -3,6 +3,7 @@
 #include <map>
 #include <memory>
 #include <string>
+#include <unordered_map>
 #include <vector>
 
 #include "services/kovanotifyd/fan_group.h"
@@ -81,6 +82,8 @@ class FilesystemWatcher : public Watcher, private FolderSource {
   RenameHistory history_;
 
   std::map<std::string, WatchRoot> to_add_;
+  /// Folders that were told to be made and removed by one record, while what was done in them is still to come.
+  std::unordered_map<HandleKey, FolderPlace> removed_;
   HandleKey cookie_folder_;
   std::string cookie_name_;
   FanRecord last_rename_;           ///< without names, which would outlive their batch,

@@ -12,6 +12,7 @@
 #include <cstring>
 #include <filesystem>
 #include <functional>
+#include <iterator>
 #include <map>
 #include <random>
 #include <set>
@@ -98,7 +99,8 @@ class FilesystemWatcherTest : public testing::Test {
     return notes_.Take();
   }
 
-  TempDir dir_;
+  /// Quiet, and fast enough to overflow the kernel's queue, where there is one.
+  TempDir dir_{fs::is_directory("/dev/shm") ? "/dev/shm" : fs::temp_directory_path().string()};
   Notebook notes_{dir_.Path()};
   std::unique_ptr<FilesystemWatcher> watcher_;
 };
@@ -133,6 +135,16 @@ TEST_F(FilesystemWatcherTest, TellsWhatHappened) {
       {"removed while behind",
        [&] { WriteFile(root + "/i/x", "1"), fs::remove_all(root + "/i"); },
        {"deleted r/i/x", "deleted/ r/i"}},
+      {"linked back",
+       [&] {
+         WriteFile(root + "/l", "1");
+         fs::rename(root + "/l", root + "/m");
+         fs::create_hard_link(root + "/m", root + "/l");
+       },
+       {"created r/l", "written r/l", "renamed r/l r/m", "created r/l"}},
+      {"removed and linked",
+       [&] { fs::remove(root + "/l"), fs::create_hard_link(root + "/m", root + "/l"); },
+       {"deleted r/l", "created r/l"}},
       {"the cookie", [&] { (void)utimensat(AT_FDCWD, (dir_ / "cookie").c_str(), nullptr, 0); }, {"cookie"}},
       {"above",
        [&] { fs::rename(dir_.Path(), dir_.Path() + "-"), fs::rename(dir_.Path() + "-", dir_.Path()); },
@@ -164,12 +176,20 @@ TEST_F(FilesystemWatcherTest, NamesInDoubtAreToldWhenTheKernelJoinsRecords) {
 }
 
 TEST_F(FilesystemWatcherTest, AnOverflowIsToldAndThenAllIsCoveredAgain) {
-  for (int i = 0; i < 20000; ++i) {
-    (void)mknod((Root() + "/f" + std::to_string(i)).c_str(), S_IFREG | 0600, 0);
-  }
+  for (int i = 0; i < 20000; ++i) (void)mknod((Root() + "/f" + std::to_string(i)).c_str(), S_IFREG | 0600, 0);
   EXPECT_THAT(Told(), testing::IsSupersetOf({"lost", "disturbed r", "covered r"}));
   WriteFile(Root() + "/f1", "1");
   EXPECT_THAT(Told(), ElementsAre("written r/f1"));
+}
+
+TEST_F(FilesystemWatcherTest, TooMuchThatWaitsInMemoryCountsAsLost) {
+  fs::create_directory(Root() + "/d");
+  FilesystemWatcher::Options options;
+  options.records_max = 2000;
+  Watch(options);
+  if (IsSkipped()) return;
+  for (int i = 0; i < 3000; ++i) (void)mknod((Root() + "/d/f" + std::to_string(i)).c_str(), S_IFREG | 0600, 0);
+  EXPECT_THAT(Told(), testing::IsSupersetOf({"lost", "disturbed r", "covered r"}));
 }
 
 TEST_F(FilesystemWatcherTest, QuietFoldersDoNotWakeIt) {
@@ -312,7 +332,10 @@ TEST_F(FilesystemWatcherTest, ReplayOfWhatIsToldGivesTheTree) {
     tree.LookAtWhatIsInDoubt();
     std::map<std::string, bool> real;
     for (const auto& entry : fs::recursive_directory_iterator(Root())) real[entry.path()] = entry.is_directory();
-    ASSERT_EQ(tree.Names(), real);
+    std::vector<std::pair<std::string, bool>> wrong;
+    std::set_symmetric_difference(tree.Names().begin(), tree.Names().end(), real.begin(), real.end(),
+                                  std::back_inserter(wrong));
+    ASSERT_THAT(wrong, IsEmpty());
     fs::remove_all(Root());
     fs::create_directory(Root());
   }
