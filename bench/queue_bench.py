@@ -4,7 +4,7 @@ daemon: the lines are appended here, as it would, and fileindexd's "sync" tells 
 
 Workload: small text files of 40 words in a fresh share, 100 a folder. "single": a file is rewritten, its line appended,
 and the index searched until the new word is found, one after the other, with pauses. "burst": so many modified files,
-one line each. "delete": so many deleted files, one line each (rm -rf). "rename": a folder with all of them. Wall
+one line each. "rename of each file": likewise. "delete": so many deleted files, one line each (rm -rf). "rename of their folder": one line. Wall
 seconds, and CPU seconds of fileindexd and kovaelasticd from /proc.
 """
 
@@ -33,6 +33,10 @@ def cpu_seconds(pid):
 def memory_mb(pid):
     with open(f"/proc/{pid}/status", encoding="ascii") as file:
         return next(int(line.split()[1]) / 1024 for line in file if line.startswith("VmHWM"))
+
+
+def renamed(path):
+    return os.path.join(os.path.dirname(path), "g" + os.path.basename(path))
 
 
 class Bench:
@@ -96,6 +100,12 @@ class Bench:
         for path in paths:
             instance.write(path, self.text())
         self.timed("burst of modified files", count, [instance.event(MODIFY, path) for path in paths])
+        renames = []
+        for path in paths:
+            os.rename(path, renamed(path))
+            renames.append(instance.event(RENAME, renamed(path), path))
+        self.timed("rename of each file", count, renames)
+        paths = [renamed(path) for path in paths]
         os.rename(f"{self.folder}/burst", f"{self.folder}/moved")
         self.timed("rename of their folder", count,
                    [instance.event(RENAME, f"{self.folder}/moved", f"{self.folder}/burst", True)])

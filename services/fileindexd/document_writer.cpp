@@ -77,11 +77,6 @@ void DocumentWriter::Remove(const std::vector<std::string>& paths, bool and_belo
   status_.DocumentsDeleted(paths.size());
 }
 
-void DocumentWriter::RemoveBelow(const std::string& folder) {
-  WillChange();
-  index_.DeleteBelow(folder);
-}
-
 void DocumentWriter::Commit() {
   uncommitted_ = false;
   index_.Commit();

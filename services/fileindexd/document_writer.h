@@ -40,8 +40,6 @@ class DocumentWriter {
   void Remove(const std::string& path) { Remove(std::vector<std::string>{path}, false); }
   /// The documents at the paths, and, with `and_below`, all below them.
   void Remove(const std::vector<std::string>& paths, bool and_below);
-  /// Removes all below a folder at once.
-  void RemoveBelow(const std::string& folder);
 
   /// Makes all that was done durable. @throws Error.
   void Commit();

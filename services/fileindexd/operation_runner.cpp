@@ -23,7 +23,7 @@ using fileindex::FileIndexOP;
 constexpr auto kCommitInterval = std::chrono::seconds(5);
 /// A comparison that has seen so many files tells how many there are.
 constexpr uint64_t kFilesBeforeCount = 500;
-constexpr unsigned kRemovedAtOnce = 5000;
+constexpr unsigned kRemovedAtOnce = 1000;
 
 }  // namespace
 
@@ -153,12 +153,18 @@ void OperationRunner::LookDelete(const std::string& path, const std::string&) {
   Compare(path);
 }
 
+/// Of a file, all that a comparison would do at its new place is done beside other files.
 void OperationRunner::LookRename(const std::string& path, const std::string& old_path) {
-  if (path != context_.root && rules_.CanBeIndexed(path)) {
-    tasks_.Submit([this, path, old_path] { writer_.RefreshRenamed(path, old_path); });
-  }
+  struct stat status = {};
+  const bool wanted = path != context_.root && rules_.CanBeIndexed(path);
+  const bool is_file = wanted && LookAt(path, status) == Presence::kThere && !S_ISDIR(status.st_mode);
+  if (wanted) tasks_.Submit([this, path, old_path] { writer_.RefreshRenamed(path, old_path); });
   if (StringStartWith(old_path, context_.root + "/")) CompareOnce(old_path);
-  CompareOnce(path);
+  if (is_file) {
+    tasks_.Submit([this, path] { RemoveBelow(path); });
+  } else {
+    CompareOnce(path);
+  }
 }
 
 void OperationRunner::LookUpsert(const std::string& path, const std::string&) {
@@ -210,17 +216,18 @@ void OperationRunner::CompareOnce(const std::string& path) {
 }
 
 void OperationRunner::Compare(const std::string& path) {
-  tasks_.Wait();
   if (path == context_.root) return CompareRoot();
   if (!StringStartWith(path, context_.root + "/")) return;
-  if (context_.folders.PlaceOf(path) == Place::kOutside) return RemoveTree(path);
+  const auto remove_tree = [this, path] { RemoveTree(path); };
+  if (context_.folders.PlaceOf(path) == Place::kOutside) return tasks_.Submit(remove_tree);
   struct stat status = {};
   const Presence presence = LookAt(path, status);
   if (presence == Presence::kUnknown) {
     return context_.status.AddFailure(std::string("cannot be examined: ") + strerror(errno), path);
   }
   const Place place = rules_.PlaceOf(path);
-  if (presence == Presence::kGone || place == Place::kOutside) return RemoveTree(path);
+  if (presence == Presence::kGone || place == Place::kOutside) return tasks_.Submit(remove_tree);
+  tasks_.Wait();
   CompareOne(path, place, status);
   S_ISDIR(status.st_mode) ? CompareFolder(path) : RemoveBelow(path);
 }
@@ -246,20 +253,19 @@ void OperationRunner::RemoveTree(const std::string& path) {
   RemoveBelow(path);
 }
 
-/// What is much is removed page by page: the index removes all at once, but cannot be interrupted then.
+/// Page by page: the index removes all at once, but cannot be interrupted then. From any thread.
 void OperationRunner::RemoveBelow(const std::string& folder) {
-  while (true) {
-    const std::vector<IndexedEntry> page = context_.index.List(folder, "", kRemovedAtOnce);
-    if (page.size() < kRemovedAtOnce) break;
-    for (const IndexedEntry& entry : page) gone_.Add(entry.path);
-    gone_.Flush();
-    tasks_.Wait();
-    CommitIfDue();
+  for (bool more = true; more;) {
+    context_.interruption.Check();
+    std::vector<std::string> paths;
+    for (IndexedEntry& entry : context_.index.List(folder, "", kRemovedAtOnce)) paths.push_back(std::move(entry.path));
+    more = paths.size() == kRemovedAtOnce;
+    if (!paths.empty()) writer_.Remove(paths, false);
   }
-  writer_.RemoveBelow(folder);
 }
 
 void OperationRunner::CompareRoot() {
+  tasks_.Wait();
   RemoveStrays();
   CompareFolder(context_.root);
 }

@@ -90,7 +90,6 @@ class Engine : public ShareIndex {
     elastic::SendRequest(reply, request);
     for (const Json::Value& part : reply["data"]) ThrowIfFailed(part);
   }
-  void DeleteBelow(const std::string& folder) override { elastic::IndexDelDir(share_, folder); }
   void Rename(const std::string& new_path, const std::string& old_path) override {
     elastic::IndexRename(share_, new_path, old_path);
   }

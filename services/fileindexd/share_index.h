@@ -32,7 +32,6 @@ class ShareIndex {
   /// Removes the documents at the paths, and, with `and_below`, all below them; in one request. Missing ones are no
   /// error.
   virtual void Delete(const std::vector<std::string>& paths, bool and_below) = 0;
-  virtual void DeleteBelow(const std::string& folder) = 0;
   virtual void Rename(const std::string& new_path, const std::string& old_path) = 0;
   virtual void Commit() = 0;
   /// At most `limit` documents below `folder`, in byte order of their paths, those after `after` when it is not "".

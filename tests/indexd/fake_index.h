@@ -56,16 +56,13 @@ class FakeIndex : public indexd::ShareIndex {
 
   void Delete(const std::vector<std::string>& paths, bool and_below) override {
     for (const std::string& path : paths) {
-      if (and_below) DeleteBelow(path);
       const std::lock_guard lock(mutex);
+      if (and_below) {
+        std::erase_if(documents, [&path](const auto& item) { return StringStartWith(item.first, path + "/"); });
+      }
       Changed(path, "");
       documents.erase(path);
     }
-  }
-
-  void DeleteBelow(const std::string& folder) override {
-    const std::lock_guard lock(mutex);
-    std::erase_if(documents, [&folder](const auto& item) { return StringStartWith(item.first, folder + "/"); });
   }
 
   void Rename(const std::string& new_path, const std::string& old_path) override {
