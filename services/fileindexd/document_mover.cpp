@@ -34,19 +34,20 @@ std::vector<std::string> EntriesOf(const std::string& folder) {
 
 }  // namespace
 
-void DocumentMover::Move(const std::string& path, const std::string& old_path) {
-  if (IsAtOrBelow(path, old_path) || IsAtOrBelow(old_path, path)) return;
-  for (const std::string& top : IndexedTopsOf(path)) {
-    MoveTree(top, old_path + top.substr(path.size()));
-  }
+std::vector<DocumentMover::Step> DocumentMover::StepsOf(const std::string& path, const std::string& old_path) {
+  std::vector<Step> steps;
+  if (IsAtOrBelow(path, old_path) || IsAtOrBelow(old_path, path)) return steps;
+  for (const std::string& top : IndexedTopsOf(path)) steps.push_back({top, old_path + top.substr(path.size())});
+  return steps;
 }
 
 /// Of a folder with very many documents, each entry on its own; the folder's own document is left to the comparison.
-void DocumentMover::MoveTree(const std::string& path, const std::string& old_path) {
+void DocumentMover::Move(const Step& step) {
+  const auto& [path, old_path] = step;
   interruption_.Check();
   if (!HoldsDocumentsOf(old_path, path)) return;
   if (IsFolder(path) && index_.List(old_path, "", kMovedAtOnce).size() == kMovedAtOnce) {
-    for (const std::string& entry : EntriesOf(path)) MoveTree(entry, old_path + entry.substr(path.size()));
+    for (const std::string& entry : EntriesOf(path)) Move({entry, old_path + entry.substr(path.size())});
     return;
   }
   writer_.WillChange();

@@ -22,12 +22,18 @@ class DocumentMover {
                 DocumentWriter& writer, const Interruption& interruption)
       : root_(root), index_(index), folders_(folders), rules_(rules), writer_(writer), interruption_(interruption) {}
 
-  /// Follows the rename of `old_path`, which lay outside the present root when the share itself was renamed or moved.
-  /// @throws Interrupted; Error.
-  void Move(const std::string& path, const std::string& old_path);
+  /// The documents at and below `old_path` that go to `path`.
+  struct Step {
+    std::string path;
+    std::string old_path;
+  };
+  /// What follows the rename of `old_path`, which lay outside the present root when the share itself was renamed or
+  /// moved. Belongs to one thread.
+  std::vector<Step> StepsOf(const std::string& path, const std::string& old_path);
+  /// From any thread. @throws Interrupted; Error.
+  void Move(const Step& step);
 
  private:
-  void MoveTree(const std::string& path, const std::string& old_path);
   std::vector<std::string> IndexedTopsOf(const std::string& path);
   bool HoldsDocumentsOf(const std::string& old_path, const std::string& path);
 

@@ -60,8 +60,7 @@ void OperationRunner::Run(const std::function<void(const std::function<void(cons
   each([&operations](const fileindex::OP&) { ++operations; });
   context_.status.BeginPass(operations);
   each([this](const fileindex::OP& op) { CarryOut(op, Stage::kMove); });
-  gone_trees_.Flush();
-  tasks_.Wait();
+  FinishMoves();
   each([this](const fileindex::OP& op) {
     CarryOut(op, Stage::kLook);
     KeepUp();
@@ -135,13 +134,31 @@ void OperationRunner::Commit() {
 
 void OperationRunner::MoveDelete(const std::string& path, const std::string&) {
   struct stat status = {};
-  if (LookAt(path, status) == Presence::kGone) gone_trees_.Add(path);
+  if (LookAt(path, status) != Presence::kGone) return;
+  BeginMove({path});
+  gone_trees_.Add(path);
 }
 
 void OperationRunner::MoveRename(const std::string& path, const std::string& old_path) {
+  BeginMove({path, old_path});
+  for (const DocumentMover::Step& step : mover_.StepsOf(path, old_path)) {
+    tasks_.Submit([this, step] { mover_.Move(step); });
+  }
+}
+
+/// What concerns other paths than all that is under way may be done beside it; else the queue's order counts.
+void OperationRunner::BeginMove(const std::vector<std::string>& paths) {
+  constexpr size_t kUnderWayMax = 10000;
+  bool free = under_way_.Count() < kUnderWayMax;
+  for (const std::string& path : paths) free = free && !under_way_.Touch(path);
+  if (!free) FinishMoves();
+  for (const std::string& path : paths) under_way_.Add(path);
+}
+
+void OperationRunner::FinishMoves() {
   gone_trees_.Flush();
   tasks_.Wait();
-  mover_.Move(path, old_path);
+  under_way_.Clear();
 }
 
 /// What is there again is compared: of a file that a folder has replaced, the queue keeps the delete alone. A reindex

@@ -14,6 +14,7 @@
 #include "services/fileindexd/document_writer.h"
 #include "services/fileindexd/interruption.h"
 #include "services/fileindexd/path_rules.h"
+#include "services/fileindexd/paths_under_way.h"
 #include "services/fileindexd/queue_tail.h"
 #include "services/fileindexd/removal_batch.h"
 #include "services/fileindexd/share_folders.h"
@@ -39,10 +40,10 @@ struct PassContext {
 };
 
 /// Carries the operations of one pass into the index, in two stages: first what removes and moves documents, in the
-/// queue's order; then what looks at the disk, which is right whatever came before, files beside each other. (The queue
-/// itself may hold a change of a file in front of the rename that brought the file's old document to its place.) Each
-/// operation may be carried out again, for example after a crash, and gives the same end. A single bad file is recorded
-/// and passed over.
+/// queue's order as far as they concern each other; then what looks at the disk, which is right whatever came before,
+/// files beside each other. (The queue itself may hold a change of a file in front of the rename that brought the
+/// file's old document to its place.) Each operation may be carried out again, for example after a crash, and gives the
+/// same end. A single bad file is recorded and passed over.
 class OperationRunner {
  public:
   explicit OperationRunner(const PassContext& context);
@@ -80,6 +81,8 @@ class OperationRunner {
   void LookFullReindex(const std::string& path, const std::string& old_path);
 
   void CarryOut(const fileindex::OP& op, Stage stage);
+  void BeginMove(const std::vector<std::string>& paths);
+  void FinishMoves();
   void CommitIfDue();
   void KeepUp();
   void Commit();
@@ -101,6 +104,7 @@ class OperationRunner {
   DocumentWriter writer_;
   DocumentMover mover_;
   TaskGroup tasks_;
+  PathsUnderWay under_way_;
   RemovalBatch gone_trees_;
   RemovalBatch gone_;
   QueueTail tail_;
