@@ -162,16 +162,14 @@ void Notifier::ReadChanges() {
   read_at_ = is_busy ? SteadyClock::now() : TimePoint::max();
 }
 
-/// Once every watcher is set up: one that is not may miss its cookie, or come to refuse what it is used for.
 void Notifier::BeginSync() {
-  if (watches_.IsSettingUp()) return;
   ReadRegistry();
-  if (watches_.IsSettingUp()) return;
   sync_problems_.clear();
   watches_.Scan();
   syncs_.Begin();
   for (size_t way = 0; way < watches_.Ways(); ++way) {
-    // A folder that is still being set up is compared when it is covered, which says all.
+    // A watcher that is still being set up may miss its cookie, or come to refuse what it is used for; but what it
+    // covers is compared then, which says all.
     if (!watches_.IsCovering(way)) continue;
     if (options_.cookies[way].Touch()) {
       syncs_.Touched(way);
