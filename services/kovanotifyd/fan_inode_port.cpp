@@ -77,6 +77,8 @@ int FanInodePort::Watch(int folder, Wanted wanted, FolderKey& key) {
   return group_.Mark(folder, kScope, MaskOf(wanted));
 }
 
+std::string FanInodePort::Reason(int error) const { return FanGroup::Reason(error, kScope); }
+
 void FanInodePort::Unwatch(FolderKey key, const std::string& path) {
   const UniqueFd folder(open(path.c_str(), O_PATH | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
   if (!folder.Valid() || Shorten(group_.KeyOf(folder.Get())) != key)

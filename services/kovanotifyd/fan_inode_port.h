@@ -18,6 +18,7 @@ class FanInodePort : public FolderPort {
   Limit WatchLimit() const override;
   int Fd() const override { return group_.Fd(); }
   int Watch(int folder, Wanted wanted, FolderKey& key) override;
+  std::string Reason(int error) const override;
   void Unwatch(FolderKey key, const std::string& path) override;
   bool UnwatchesByPath() const override { return true; }
   bool Read(std::vector<FolderRecord>& records) override;

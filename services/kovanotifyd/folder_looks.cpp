@@ -52,6 +52,11 @@ bool IsFolder(const dirent& entry, int parent) {
   return fstatat(parent, entry.d_name, &status, AT_SYMLINK_NOFOLLOW) == 0 && S_ISDIR(status.st_mode);
 }
 
+std::string TooMany(const FolderPort::Limit& limit) {
+  return "too many folders for the " + std::to_string(limit.watches) + " watches that " + limit.setting +
+         " allows, of which 80 % are used at most; raise it";
+}
+
 bool IsDots(std::string_view name) { return name == "." || name == ".."; }
 
 }  // namespace
@@ -118,35 +123,36 @@ bool FolderWatcher::Claim(Id id, int folder, FolderKey key, WatchListener& liste
   return true;
 }
 
+/// What comes of it that the folder at the place of `id` is not there, cannot be read, or cannot be watched.
 FolderWatcher::Seen FolderWatcher::Unwatchable(Id id, int error, WatchListener& listener) {
   const bool gone = error == ENOENT || error == ENOTDIR || error == ELOOP || error == ESTALE;
   const bool unreadable = error == EACCES || error == ENAMETOOLONG || error == EIO;
-  const bool is_root = tree_.Has(id, FolderTree::kRoot);
-  const Ref ref = tree_.RefOf(id);
-  const std::string path = tree_.Path(id);
-  if (is_root && (gone || unreadable)) Refuse(path, strerror(error), listener);
-  if (gone || unreadable) {
-    if (tree_.Get(ref) == kNone || !IsCovered(id)) return Seen::kRefused;
-    if (gone) {
-      const bool leads_to_root = tree_.Has(id, FolderTree::kPassage) || tree_.Has(id, FolderTree::kRoot);
-      if (leads_to_root && tree_.Key(id) == 0) return Seen::kGone;  // stays for the root's sake
-      // What lies above it may have been moved, with it: that is known when all records have been read.
-      doubts_.push_back({tree_.RefOf(tree_.Parent(id)), std::string(tree_.Name(id))});
-      RemoveFolder(id, listener);
-      return Seen::kGone;
-    }
-    while (tree_.FirstChild(id) != kNone) tree_.Remove(tree_.FirstChild(id), [this](Id each) { DropKey(each); });
-    DropKey(id);
-    if (!tree_.Has(id, FolderTree::kUnreadable)) unreadable_.push_back(ref);
-    tree_.Set(id, FolderTree::kUnreadable, true);
-    return Seen::kUnreadable;
+  if (!gone && !unreadable) {
+    const std::string reason = error == ENOSPC ? TooMany(port_->WatchLimit()) : port_->Reason(error);
+    for (const std::string& root : RootsOver(id)) Refuse(root, reason, listener);
+    return Seen::kRefused;
   }
-  const FolderPort::Limit limit = port_->WatchLimit();
-  const std::string reason = error == ENOSPC ? "too many folders for the " + std::to_string(limit.watches) +
-                                                   " watches of a user, which " + limit.setting + " raises"
-                                             : path + ": " + strerror(error);
-  for (const std::string& root : RootsOver(id)) Refuse(root, reason, listener);
-  return Seen::kRefused;
+  const Ref ref = tree_.RefOf(id);
+  if (tree_.Has(id, FolderTree::kRoot)) Refuse(tree_.Path(id), strerror(error), listener);
+  if (tree_.Get(ref) == kNone || !IsCovered(id)) return Seen::kRefused;
+  if (gone) {
+    ForgetGone(id, listener);
+    return Seen::kGone;
+  }
+  DropKey(id);
+  for (const Ref child : Children(id)) {
+    if (!LeadsToRoot(child.id)) tree_.Remove(child.id, [this](Id each) { DropKey(each); });
+  }
+  if (!tree_.Has(id, FolderTree::kUnreadable)) unreadable_.push_back(ref);
+  tree_.Set(id, FolderTree::kUnreadable, true);
+  return Seen::kUnreadable;
+}
+
+void FolderWatcher::ForgetGone(Id id, WatchListener& listener) {
+  if (LeadsToRoot(id) && tree_.Key(id) == 0) return;  // stays for the root's sake
+  // What lies above it may have been moved, with it: that is known when all records have been read.
+  doubts_.push_back({tree_.RefOf(tree_.Parent(id)), std::string(tree_.Name(id))});
+  RemoveFolder(id, listener);
 }
 
 /// Brings the tree's folders below `id` in line with those in the open folder.
@@ -170,14 +176,11 @@ void FolderWatcher::List(Id id, UniqueFd folder, std::vector<Ref>& below, WatchL
     if (child != kNone) tree_.Set(child, FolderTree::kSeen, wanted || tree_.Has(child, FolderTree::kPassage));
   }
   const bool complete = errno == 0;
-  std::vector<Ref> gone;
-  for (Id child = tree_.FirstChild(id); child != kNone; child = tree_.NextSibling(child)) {
-    const bool seen = tree_.Has(child, FolderTree::kSeen) || tree_.Has(child, FolderTree::kRoot);
-    tree_.Set(child, FolderTree::kSeen, false);
-    if (complete && !seen) gone.push_back(tree_.RefOf(child));
-  }
-  for (const Ref ref : gone) {
-    if (tree_.Get(ref) != kNone) RemoveFolder(ref.id, listener);
+  for (const Ref child : Children(id)) {
+    if (tree_.Get(child) == kNone) continue;
+    const bool seen = tree_.Has(child.id, FolderTree::kSeen) || tree_.Has(child.id, FolderTree::kRoot);
+    tree_.Set(child.id, FolderTree::kSeen, false);
+    if (complete && !seen) RemoveFolder(child.id, listener);
   }
 }
 

@@ -58,6 +58,8 @@ class FolderPort {
   /// Watches an open folder. What was wanted of it before is still wanted.
   /// @return errno, or 0 and the folder's key: the same each time as long as it is watched, and no other folder's.
   virtual int Watch(int folder, Wanted wanted, FolderKey& key) = 0;
+  /// Why watching failed, a sentence without a full stop.
+  virtual std::string Reason(int error) const = 0;
   /// Ends it, as far as possible: `path` is where the folder was, for ports that need it. Records may still come.
   virtual void Unwatch(FolderKey key, const std::string& path) = 0;
   /// Whether Unwatch needs the path.

@@ -12,7 +12,8 @@ void FolderWatcher::OnRecord(const FolderRecord& record, WatchListener& listener
   if (record.kind == Kind::kLost) return OnLost(listener);
   if (record.kind == Kind::kRenamed) return OnRenamed(record, listener);
   if (record.kind == Kind::kSelfMoved || record.kind == Kind::kSelfGone) return OnSelf(record, listener);
-  if (record.kind == Kind::kAttributes && record.folder == cookie_folder_ && record.name == cookie_name_) {
+  if (record.kind == Kind::kAttributes && record.folder == cookie_folder_ && cookie_folder_ != 0 &&
+      record.name == cookie_name_) {
     OnCookieTouched(listener);
   }
   const Id parent = tree_.ByKey(record.folder);
@@ -120,10 +121,10 @@ void FolderWatcher::MoveFolder(Id old_parent, Id parent, const FolderRecord& rec
   }
   if (folder == replaced) return;
   const Ref moved = tree_.RefOf(folder);
-  const bool same_rules = IgnoredIn(old_parent) == IgnoredIn(parent);
+  const bool same_rules = HaveSameRules(old_parent, parent);
   if (replaced != kNone) RemoveFolder(replaced, listener);
-  const bool as_told =
-      tree_.Get(moved) != kNone && tree_.Child(parent, record.name) == kNone && !tree_.IsWithin(parent, folder);
+  const bool as_told = tree_.Get(moved) != kNone && tree_.Get(target) != kNone &&
+                       tree_.Child(parent, record.name) == kNone && !tree_.IsWithin(parent, folder);
   if (!as_told || !same_rules || !IsWanted(parent, record.name)) {
     if (tree_.Get(moved) != kNone) RemoveFolder(folder, listener);
     if (tree_.Get(target) != kNone) OnFolderCreated(parent, record.name, listener);

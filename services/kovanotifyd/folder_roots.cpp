@@ -32,9 +32,16 @@ void FolderWatcher::Remove(const std::string& root) {
   }
 }
 
+/// Counted again where a folder was added, moved or removed since.
 uint64_t FolderWatcher::Watches(const std::string& root) const {
   const auto found = roots_.find(root);
-  const Id top = found == roots_.end() ? kNone : tree_.Get(found->second.folder);
+  if (found == roots_.end()) return 0;
+  Count& count = found->second.count;
+  if (count.at != tree_.Changes()) count = {tree_.Changes(), CountWatches(tree_.Get(found->second.folder))};
+  return count.watches;
+}
+
+uint64_t FolderWatcher::CountWatches(Id top) const {
   uint64_t watches = 0;
   for (Id at = top; at != kNone;) {
     if (tree_.Key(at) != 0) ++watches;
@@ -59,12 +66,18 @@ std::vector<std::string> FolderWatcher::RootsOver(Id id) const {
 
 std::vector<std::string> FolderWatcher::RootsWithin(Id id) const {
   std::vector<std::string> roots;
-  if (!tree_.Has(id, FolderTree::kRoot) && !tree_.Has(id, FolderTree::kPassage)) return roots;
+  if (!LeadsToRoot(id)) return roots;
   for (const auto& [path, root] : roots_) {
     const Id folder = tree_.Get(root.folder);
     if (folder != kNone && tree_.IsWithin(folder, id)) roots.push_back(path);
   }
   return roots;
+}
+
+std::vector<FolderTree::Ref> FolderWatcher::Children(Id id) const {
+  std::vector<Ref> children;
+  for (Id at = tree_.FirstChild(id); at != kNone; at = tree_.NextSibling(at)) children.push_back(tree_.RefOf(at));
+  return children;
 }
 
 bool FolderWatcher::IsCovered(Id id) const {
@@ -87,6 +100,14 @@ std::vector<const std::vector<std::string>*> FolderWatcher::IgnoredIn(Id id) con
     if (at == FolderTree::kTop) return ignored;
     names.push_back(tree_.Name(at));
   }
+}
+
+/// Whether the same is watched below both.
+bool FolderWatcher::HaveSameRules(Id a, Id b) const {
+  const auto ignored_a = IgnoredIn(a);
+  const auto ignored_b = IgnoredIn(b);
+  return std::equal(ignored_a.begin(), ignored_a.end(), ignored_b.begin(), ignored_b.end(),
+                    [](const auto* x, const auto* y) { return *x == *y; });
 }
 
 bool FolderWatcher::IsWanted(Id parent, std::string_view name) const {
@@ -125,6 +146,7 @@ void FolderWatcher::Disturb(Id id, WatchListener& listener) {
 }
 
 void FolderWatcher::Refuse(const std::string& root, const std::string& reason, WatchListener& listener) {
+  if (roots_.count(root) == 0) return;
   Remove(root);
   listener.OnRefused(root, reason);
 }

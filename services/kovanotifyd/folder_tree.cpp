@@ -126,6 +126,7 @@ FolderTree::Id FolderTree::FindOrAdd(std::string_view path) {
 }
 
 void FolderTree::Move(Id id, Id parent, std::string_view name) {
+  ++changes_;
   Unlink(id);
   SetName(nodes_[id], name);
   Link(id, parent);
@@ -153,6 +154,7 @@ FolderTree::Id FolderTree::ByKey(FolderKey key) const {
 }
 
 void FolderTree::SetKey(Id id, FolderKey key) {
+  ++changes_;
   if (nodes_[id].key != 0) {
     by_key_.Erase(id);
     --keys_;

@@ -85,6 +85,8 @@ class FolderTree {
   FolderKey Key(Id id) const { return nodes_[id].key; }
   /// How many have one.
   uint64_t Keys() const { return keys_; }
+  /// Grows whenever a key is set or a folder moved.
+  uint64_t Changes() const { return changes_; }
 
   Id Parent(Id id) const { return nodes_[id].parent; }
   Id FirstChild(Id id) const { return nodes_[id].first_child; }
@@ -125,6 +127,7 @@ class FolderTree {
   std::deque<Node> nodes_;
   Id free_ = kNone;
   uint64_t keys_ = 0;
+  uint64_t changes_ = 1;
   IdTable by_place_;
   IdTable by_key_;
 };

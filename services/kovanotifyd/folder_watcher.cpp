@@ -106,18 +106,15 @@ bool FolderWatcher::IsAllRead() const {
 /// The tree shows now what the disk was when the folders were looked at. One that was moved since then, by itself or
 /// with those above it, may have been another.
 void FolderWatcher::OnAllRead() {
-  for (const Ref ref : looked_at_) {
+  for (const Ref ref : std::exchange(looked_at_, {})) {
     const Id id = tree_.Get(ref);
     if (id != kNone && IsMoved(id)) checks_.push_back({ref, false});
   }
-  looked_at_.clear();
-  for (const Ref ref : moved_) {
+  for (const Ref ref : std::exchange(moved_, {})) {
     const Id id = tree_.Get(ref);
     if (id != kNone) tree_.Set(id, FolderTree::kMoved, false);
   }
-  moved_.clear();
-  places_.insert(places_.end(), doubts_.begin(), doubts_.end());
-  doubts_.clear();
+  for (Place& place : std::exchange(doubts_, {})) places_.push_back(std::move(place));
   if (cookie_ == Cookie::kAfterAllRead) cookie_ = Cookie::kAfterLooks;
 }
 

@@ -47,10 +47,15 @@ class FolderWatcher : public Watcher {
   using Ref = FolderTree::Ref;
   static constexpr Id kNone = FolderTree::kNone;
 
+  struct Count {
+    uint64_t at = 0;  ///< of FolderTree::Changes
+    uint64_t watches = 0;
+  };
   struct Root {
     std::vector<std::string> ignore;
     Ref folder;
     uint64_t mount = 0;  ///< the mount that it lies on; nothing on another is entered
+    mutable Count count = {};
   };
   using Roots = std::map<std::string, Root>;
   /// Everything below a root is looked at. What the disk holds there is for the comparison to find, so nothing is
@@ -92,15 +97,20 @@ class FolderWatcher : public Watcher {
   Seen Attach(Id id, int folder, WatchListener& listener);
   bool Claim(Id id, int folder, FolderKey key, WatchListener& listener);
   Seen Unwatchable(Id id, int error, WatchListener& listener);
+  void ForgetGone(Id id, WatchListener& listener);
   void List(Id id, UniqueFd folder, std::vector<Ref>& below, WatchListener& listener);
   bool IsOnRootsMount(Id id, int folder);
   void CheckPlace(const Place& place, WatchListener& listener);
 
   // The roots, and what is watched for their sake: folder_roots.cpp.
+  uint64_t CountWatches(Id top) const;
   std::vector<std::string> RootsOver(Id id) const;
   std::vector<std::string> RootsWithin(Id id) const;
   bool IsCovered(Id id) const;
+  bool LeadsToRoot(Id id) const { return tree_.Has(id, FolderTree::kRoot) || tree_.Has(id, FolderTree::kPassage); }
+  std::vector<Ref> Children(Id id) const;
   std::vector<const std::vector<std::string>*> IgnoredIn(Id id) const;
+  bool HaveSameRules(Id a, Id b) const;
   bool IsWanted(Id parent, std::string_view name) const;
   void RemoveFolder(Id id, WatchListener& listener);
   std::vector<std::string> DetachRoots(Id id);

@@ -5,6 +5,7 @@
 #include <unistd.h>
 
 #include <cerrno>
+#include <cstring>
 #include <fstream>
 #include <unordered_map>
 
@@ -130,6 +131,8 @@ int InotifyPort::Watch(int folder, Wanted wanted, FolderKey& key) {
   key = static_cast<FolderKey>(watch);
   return 0;
 }
+
+std::string InotifyPort::Reason(int error) const { return strerror(error); }
 
 void InotifyPort::Unwatch(FolderKey key, const std::string& /*path*/) {
   (void)inotify_rm_watch(inotify_.Get(),

@@ -19,6 +19,7 @@ class InotifyPort : public FolderPort {
   Limit WatchLimit() const override;
   int Fd() const override { return inotify_.Get(); }
   int Watch(int folder, Wanted wanted, FolderKey& key) override;
+  std::string Reason(int error) const override;
   void Unwatch(FolderKey key, const std::string& path) override;
   bool UnwatchesByPath() const override { return false; }
   bool Read(std::vector<FolderRecord>& records) override;

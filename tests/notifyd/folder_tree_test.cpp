@@ -27,6 +27,12 @@ bool IsAtOrBelow(const std::string& path, const std::string& folder) {
 /// Paths and their keys, changed in the plainest way.
 using Model = std::map<std::string, FolderKey>;
 
+void AddParents(Model& model, const std::string& path) {
+  for (size_t end = path.find('/', 1); end != std::string::npos; end = path.find('/', end + 1)) {
+    model.emplace(path.substr(0, end), 0);
+  }
+}
+
 void RemoveFrom(Model& model, const std::string& folder) {
   std::erase_if(model, [&folder](const auto& entry) { return IsAtOrBelow(entry.first, folder); });
 }
@@ -51,9 +57,7 @@ TEST(FolderTreeTest, IsWhatAPlainListOfPathsWouldBe) {
     if (choice < 5) {
       const Id id = tree.FindOrAdd(path);
       tree.SetKey(id, ++last_key);
-      for (size_t end = path.find('/', 1); end != std::string::npos; end = path.find('/', end + 1)) {
-        model.emplace(path.substr(0, end), 0);
-      }
+      AddParents(model, path);
       model[path] = last_key;
       continue;
     }
@@ -72,9 +76,7 @@ TEST(FolderTreeTest, IsWhatAPlainListOfPathsWouldBe) {
     } else if (model.count(path) == 0 && !IsAtOrBelow(path, from)) {
       const size_t slash = path.rfind('/');
       const Id parent = tree.FindOrAdd(path.substr(0, slash));
-      for (size_t end = path.find('/', 1); end != std::string::npos; end = path.find('/', end + 1)) {
-        model.emplace(path.substr(0, end), 0);
-      }
+      AddParents(model, path);
       tree.Move(id, parent, path.substr(slash + 1));
       MoveIn(model, from, path);
     }
