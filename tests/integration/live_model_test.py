@@ -31,7 +31,7 @@ class World:
 
     def __init__(self, seed):
         self.random, self.number, self.stopped = random.Random(seed), 0, None
-        self.linked = set()  # numbers of files that had several names
+        self.linked = set()  # numbers of files that got another name since the last checkpoint
         self.log = collections.deque(maxlen=REMEMBERED)
         self.instance = LiveInstance()
         shared_memory = "/dev/shm" if os.access("/dev/shm", os.W_OK) else None
@@ -144,7 +144,7 @@ class World:
                 self.fill(f"{path}/{self.random.choice(NAMES)}", "w")
 
     def move(self, old, new):
-        if not old or not new or self.would_part_links(old, new):
+        if not old or not new or self.would_part_links(old, new) or self.has_new_name(new):
             return False
         try:
             os.rename(old, new)
@@ -155,6 +155,14 @@ class World:
             self.note("copy and remove", old, new)
             shutil.move(old, new)
         return True
+
+    def has_new_name(self, path):
+        """Whether a file at or below the path got another name that may not have been seen yet. Nothing tells what happens
+        through a name that comes and goes before anybody looks, so such names stay until the next checkpoint."""
+        if not self.linked:
+            return False
+        files = [path] + [os.path.join(parent, name) for parent, _, names in os.walk(path) for name in names]
+        return any(os.path.lexists(file) and os.lstat(file).st_ino in self.linked for file in files)
 
     def would_part_links(self, old, new):
         """A change through one name is told of the names in the same share, not in others or outside."""
@@ -182,13 +190,13 @@ class World:
 
     def delete(self):
         path = self.entry(lambda entry: not entry.is_dir(follow_symlinks=False))
-        if path:
+        if path and not self.has_new_name(path):
             os.remove(path)
             self.note("delete", path)
 
     def remove_folder(self):
         path = self.subfolder()
-        if path:
+        if path and not self.has_new_name(path):
             self.note("rmtree", path)
             shutil.rmtree(path)
 
@@ -267,31 +275,22 @@ class World:
 
     # Checkpoints.
 
-    def differences(self):
-        """Without the time at which a file lost a name that nobody had seen before it went: nothing tells of that, and it
-        is the one thing that may stay behind until the next comparison."""
-        def is_lost_name(expected, indexed):
-            if not expected or not indexed or expected.keys() | indexed.keys() != {"stamp"}:
-                return False
-            (size, mtime, _, inode), found = expected["stamp"].split("."), indexed["stamp"].split(".")
-            return [size, mtime, inode] == [found[0], found[1], found[3]] and int(inode) in self.linked
-        return {path: pair for path, pair in self.instance.differences().items() if not is_lost_name(*pair)}
-
     def check(self):
         """What differs between disk and index, and all that is known of it; "" when nothing does."""
         self.continue_reader()
         self.instance.ctl("up")
         self.note("sync")
         problems = self.instance.sync()
-        found = self.differences()
+        found = self.instance.differences()
         if not found:
+            self.linked.clear()
             return ""
         lines = [f"the daemons say: {problems}", f"notification daemon: {self.instance.notifyd()}"]
         for path, (expected, indexed) in sorted(found.items())[:20]:
             lines.append(f"{path!r}\n  disk  {expected}\n  index {indexed}")
             lines += [f"    {at:.3f} {words}" for at, *words in itertools.islice(self.history(path), 25)]
         time.sleep(2)
-        later = self.differences()
+        later = self.instance.differences()
         lines.append(f"{len(found)} paths differ, {len(later)} two seconds later")
         return "\n".join(lines)
 
