@@ -37,7 +37,6 @@ void FileLinks::OnChange(int64_t id, const DocRow* before, const DocRow* after) 
   const std::string old_stamp = StampOf(before);
   const std::string stamp = StampOf(after);
   database_.Prepare("DELETE FROM suspects WHERE id = ?1").Bind(1, id).Run();
-  const bool was_suspect = sqlite3_changes(database_.Handle()) > 0;
   if (stamp == old_stamp) return;
   const int64_t old_file = FileOf(old_stamp);
   const int64_t file = FileOf(stamp);
@@ -48,21 +47,22 @@ void FileLinks::OnChange(int64_t id, const DocRow* before, const DocRow* after) 
     }
     if (file != 0) database_.Prepare("INSERT INTO files VALUES(?1, ?2)").Bind(1, file).Bind(2, id).Run();
   }
-  // What made a suspect of this one has done so with the others.
-  if (file != 0 && !was_suspect) MarkOthers(file, id, stamp);
+  // Also of a suspect: the file may have changed again since the one that made it a suspect was written.
+  if (file != 0) MarkOthers(file, id, stamp);
 }
 
 void FileLinks::MarkOthers(int64_t file, int64_t id, const std::string& stamp) {
   std::vector<int64_t> others;
   {
-    Statement statement = database_.Prepare("SELECT id FROM files WHERE file = ?1 AND id <> ?2");
+    Statement statement =
+        database_.Prepare("SELECT id FROM files WHERE file = ?1 AND id <> ?2 AND id NOT IN (SELECT id FROM suspects)");
     statement.Bind(1, file).Bind(2, id);
     while (statement.Step()) others.push_back(statement.Int(0));
   }
   for (const int64_t other : others) {
     const std::optional<StoredDocument> stored = FindDocument(database_, other);
     if (!stored.has_value() || StampOf(&stored->row) == stamp) continue;
-    database_.Prepare("INSERT OR IGNORE INTO suspects VALUES(?1)").Bind(1, other).Run();
+    database_.Prepare("INSERT INTO suspects VALUES(?1)").Bind(1, other).Run();
   }
 }
 

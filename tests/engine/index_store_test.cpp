@@ -55,12 +55,14 @@ TEST_F(IndexStoreTest, OtherNamesOfAChangedFileAreSuspects) {
   EXPECT_EQ("", suspects());
   Put(stamped("/b", "1.1.2.77"));
   EXPECT_EQ("/a|/c|", suspects());
-  Put(stamped("/a", "1.1.2.77"));
+  Put(stamped("/a", "1.1.3.77"));
+  EXPECT_EQ("/b|/c|", suspects()) << "the file changed again meanwhile";
+  Put(stamped("/b", "1.1.3.77"));
   store_->Commit();
   Reopen();
   EXPECT_EQ("/c|", suspects());
   Json::Value change;
-  change["_KOVAStamp"] = "1.1.2.77";
+  change["_KOVAStamp"] = "1.1.3.77";
   store_->Set("/c", change);
   EXPECT_EQ("", suspects());
   change = Json::Value();
