@@ -10,7 +10,7 @@ namespace {
 class VolumeTest : public WorkerTest {
  protected:
   void SetUp() override {
-    is_mount_point = [this](const std::string& path) { return path == mounted ? 1 : 0; };
+    is_mount_point = [this](const std::string& path) { return mounted && path == mount_point ? 1 : 0; };
     WorkerTest::SetUp();
   }
   void TearDown() override {
@@ -18,33 +18,34 @@ class VolumeTest : public WorkerTest {
     WorkerTest::TearDown();
   }
 
-  void MountAt(const std::string& mount_point) {
-    mounted = mount_point;
+  void MountAt(const std::string& place) {
+    mount_point = place;
+    mounted = true;
     for (const char* name : {"a", "d/b", "d/c"}) test::WriteFile(At(name), name);
     worker = MakeWorker();
     Process(Line(kReindex, root));
     ASSERT_EQ(Expected(), Indexed());
   }
   void Unmount(bool leaves_folder) {
-    mounted = "";
+    mounted = false;
     fs::rename(root, root + ".away");
     if (leaves_folder) fs::create_directory(root);
   }
-  void MountAgain(const std::string& mount_point) {
+  void MountAgain() {
     if (fs::exists(root)) fs::remove(root);
     fs::rename(root + ".away", root);
-    mounted = mount_point;
+    mounted = true;
   }
 
-  std::string mounted;
+  std::string mount_point;
+  std::atomic<bool> mounted{false};
 };
 
 TEST_F(VolumeTest, AwayVolumeIsNoDeletionAndIsComparedWhenItIsBack) {
   for (const bool is_root : {true, false}) {
     for (const bool restarted : {false, true}) {
       SCOPED_TRACE(testing::Message() << is_root << restarted);
-      const std::string mount_point = is_root ? root : fs::path(root).parent_path().string();
-      MountAt(mount_point);
+      MountAt(is_root ? root : fs::path(root).parent_path().string());
       const std::set<std::string> before = Indexed();
       Unmount(is_root);
       Queue(Line(kReindex, root) + Line(kDelete, At("a")));
@@ -55,7 +56,7 @@ TEST_F(VolumeTest, AwayVolumeIsNoDeletionAndIsComparedWhenItIsBack) {
       EXPECT_EQ(3U + 1U, index->documents.size());
       test::WriteFile(root + ".away/d/b", "changed elsewhere");
       fs::remove(queue_path);
-      MountAgain(mount_point);
+      MountAgain();
       WaitForState("idle");
       EXPECT_EQ(Expected(), Indexed());
       worker->Stop();
@@ -72,7 +73,7 @@ TEST_F(VolumeTest, UnmountedInTheMiddleOfAPassIsTakenUpAgain) {
   };
   EXPECT_THROW(Process(Line(kModify, At("a")) + Line(kReindex, At("d"))), Error);
   index->before_write = nullptr;
-  MountAgain(root);
+  MountAgain();
   worker->RunOnce();
   EXPECT_EQ(Expected(), Indexed());
 }
