@@ -37,7 +37,6 @@ void FileLinks::OnChange(int64_t id, const DocRow* before, const DocRow* after) 
   const std::string old_stamp = StampOf(before);
   const std::string stamp = StampOf(after);
   database_.Prepare("DELETE FROM suspects WHERE id = ?1").Bind(1, id).Run();
-  if (stamp == old_stamp) return;
   const int64_t old_file = FileOf(old_stamp);
   const int64_t file = FileOf(stamp);
   if (old_file != file) {
@@ -47,7 +46,8 @@ void FileLinks::OnChange(int64_t id, const DocRow* before, const DocRow* after) 
     }
     if (file != 0) database_.Prepare("INSERT INTO files VALUES(?1, ?2)").Bind(1, file).Bind(2, id).Run();
   }
-  // Also of a suspect: the file may have changed again since the one that made it a suspect was written.
+  // Also when it was a suspect, or has the stamp of before: another name may have been looked at before the file last
+  // changed, and written since.
   if (file != 0) MarkOthers(file, id, stamp);
 }
 

@@ -57,6 +57,10 @@ TEST_F(IndexStoreTest, OtherNamesOfAChangedFileAreSuspects) {
   EXPECT_EQ("/a|/c|", suspects());
   Put(stamped("/a", "1.1.3.77"));
   EXPECT_EQ("/b|/c|", suspects()) << "the file changed again meanwhile";
+  Put(stamped("/b", "1.1.2.77"));
+  EXPECT_EQ("/a|/c|", suspects());
+  Put(stamped("/a", "1.1.3.77"));
+  EXPECT_EQ("/b|/c|", suspects()) << "it was looked at before that, and written behind it";
   Put(stamped("/b", "1.1.3.77"));
   store_->Commit();
   Reopen();
