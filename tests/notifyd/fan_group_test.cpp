@@ -1,76 +1,13 @@
 #include "services/kovanotifyd/fan_group.h"
 
-#include <fcntl.h>
-#include <sys/stat.h>
-#include <unistd.h>
-
-#include <cerrno>
-#include <cstdio>
-#include <cstring>
+#include <cstdint>
 #include <string>
 #include <vector>
 
 #include <gtest/gtest.h>
 
-#include "tests/support/temp_dir.h"
-
 namespace ferrox::notifyd {
 namespace {
-
-using test::TempDir;
-using test::WriteFile;
-
-class FanGroupTest : public testing::Test {
- protected:
-  void SetUp() override {
-    const std::string reason = group_.Open();
-    if (!reason.empty()) GTEST_SKIP() << reason;
-    const int error = group_.Mark(dir_.Path(), FanGroup::Scope::kFolder, FAN_CREATE | FAN_RENAME | FAN_ONDIR);
-    if (error != 0) GTEST_SKIP() << FanGroup::Reason(error, FanGroup::Scope::kFolder);
-  }
-
-  UniqueFd OpenFolder(const std::string& path) { return UniqueFd(open(path.c_str(), O_PATH | O_CLOEXEC)); }
-
-  TempDir dir_;
-  FanGroup group_;
-  FanBatch batch_;
-};
-
-TEST_F(FanGroupTest, RecordsCarryTheKeysOfFolders) {
-  ASSERT_EQ(mkdir((dir_ / "a").c_str(), 0755), 0);
-  ASSERT_EQ(rename((dir_ / "a").c_str(), (dir_ / "b").c_str()), 0);
-  ASSERT_EQ(group_.Read(batch_), 0);
-  EXPECT_EQ(group_.Read(batch_), EAGAIN) << "and what was read is gone from the batch";
-  ASSERT_EQ(mkdir((dir_ / "c").c_str(), 0755), 0);
-  ASSERT_EQ(rename((dir_ / "c").c_str(), (dir_ / "d").c_str()), 0);
-  ASSERT_EQ(group_.Read(batch_), 0);
-  ASSERT_EQ(batch_.records.size(), 2U);
-  const UniqueFd top = OpenFolder(dir_.Path());
-  const UniqueFd below = OpenFolder(dir_ / "d");
-  const HandleKey key = group_.KeyOf(top.Get());
-  const FanRecord& renamed = batch_.records[1];
-  EXPECT_EQ(renamed.folder, key);
-  EXPECT_EQ(renamed.name, "c");
-  EXPECT_EQ(renamed.new_folder, key);
-  EXPECT_EQ(renamed.new_name, "d");
-  EXPECT_EQ(renamed.target, group_.KeyOf(below.Get()));
-  EXPECT_EQ(renamed.target, group_.KeyOf(below.Get(), key));
-  EXPECT_EQ(batch_.records[0].target, renamed.target);
-  EXPECT_TRUE(renamed.IsFolder());
-  EXPECT_TRUE(FanGroup::IsSameFileSystem(key, renamed.target));
-}
-
-TEST_F(FanGroupTest, AKeyOpensItsFolderWhereverItIs) {
-  ASSERT_EQ(mkdir((dir_ / "a").c_str(), 0755), 0);
-  const HandleKey key = group_.KeyOf(OpenFolder(dir_ / "a").Get());
-  ASSERT_EQ(rename((dir_ / "a").c_str(), (dir_ / "b").c_str()), 0);
-  const UniqueFd mount(open(dir_.Path().c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
-  const UniqueFd opened = FanGroup::OpenKey(key, mount.Get(), O_PATH);
-  if (!opened.Valid() && (errno == EPERM || errno == EOPNOTSUPP)) GTEST_SKIP() << strerror(errno);
-  EXPECT_EQ(group_.KeyOf(opened.Get()), key);
-  ASSERT_EQ(rmdir((dir_ / "b").c_str()), 0);
-  EXPECT_FALSE(FanGroup::OpenKey("", mount.Get(), O_PATH).Valid());
-}
 
 /// The bytes of one record as the kernel writes them: a folder's handle of 8 bytes and a name.
 std::string RecordBytes(const std::string& name) {
