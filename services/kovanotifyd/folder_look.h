@@ -10,7 +10,7 @@ struct FolderIdentity {
   uint64_t device = 0;
   uint64_t inode = 0;
   int64_t born_ns = 0;      ///< when it was made, 0 where the file system does not tell: inode numbers are given anew
-  uint64_t mount = 0;       ///< as the mount table has it
+  uint64_t mount = 0;       ///< as the mount table has it, 0 where the kernel does not tell
   uint64_t mount_once = 0;  ///< the same, never given to another mount; 0 where the kernel does not tell
 
   bool operator==(const FolderIdentity&) const = default;

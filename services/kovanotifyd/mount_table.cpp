@@ -75,14 +75,20 @@ bool MountTable::IsMounted(const Mount& mount) const {
   return line != lines_.end() && line->second.entry == mount.entry;
 }
 
-uint64_t MountTable::NetworkMountOf(const std::string& path) const {
-  const auto nearest = std::max_element(lines_.begin(), lines_.end(), [&path](const auto& a, const auto& b) {
-    const auto depth = [&path](const std::string& point) { return IsAtOrBelow(path, point) ? point.size() : 0; };
-    return depth(a.second.point) < depth(b.second.point);
-  });
-  const bool is_network =
-      nearest != lines_.end() && nearest->second.is_network && IsAtOrBelow(path, nearest->second.point);
-  return is_network ? nearest->first : 0;
+uint64_t MountTable::MountOf(const std::string& path) const {
+  uint64_t nearest = 0;
+  size_t depth = 0;
+  for (const auto& [id, line] : lines_) {
+    if (line.point.size() < depth || !IsAtOrBelow(path, line.point)) continue;
+    depth = line.point.size();
+    nearest = id;
+  }
+  return nearest;
+}
+
+bool MountTable::IsNetwork(uint64_t id) const {
+  const auto line = lines_.find(id);
+  return line != lines_.end() && line->second.is_network;
 }
 
 }  // namespace ferrox::notifyd

@@ -28,9 +28,10 @@ class MountTable {
   /// Without an entry when there is none of that id.
   Mount Find(uint64_t id) const;
   bool IsMounted(const Mount& mount) const;
-  /// The id of the mount that a path is on when its server may be away, so that a look at it may not come back; else 0.
-  /// The path itself is not looked at.
-  uint64_t NetworkMountOf(const std::string& path) const;
+  /// The id of the mount that a real path is on, as far as the table tells: nothing is looked at but that.
+  uint64_t MountOf(const std::string& path) const;
+  /// Whether the mount's server may be away, so that a look at a path there may not come back.
+  bool IsNetwork(uint64_t id) const;
 
  private:
   struct Line {

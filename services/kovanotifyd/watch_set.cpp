@@ -128,10 +128,14 @@ void WatchSet::Examine() {
 
 /// A folder whose server may not answer is taken for what it is said to be.
 FolderLook WatchSet::Look(const std::string& path) const {
+  const uint64_t mount = mounts_.MountOf(path);
   FolderLook look;
-  look.identity.mount = mounts_.NetworkMountOf(path);
-  if (look.identity.mount == 0) return LookAtFolder(path);
-  look.result = FolderLook::Result::kUsable;
+  if (mounts_.IsNetwork(mount)) {
+    look.result = FolderLook::Result::kUsable;
+  } else {
+    look = LookAtFolder(path);
+  }
+  if (look.identity.mount == 0) look.identity.mount = mount;
   return look;
 }
 
@@ -180,7 +184,7 @@ void WatchSet::Begin(Root& root, const FolderLook& look) {
   root.mount = mounts_.Find(look.identity.mount);
   root.way = 0;
   root.reason.clear();
-  if (mounts_.NetworkMountOf(root.watch.path) == 0) guard_.Add(root.watch.path);
+  if (!mounts_.IsNetwork(look.identity.mount)) guard_.Add(root.watch.path);
   TryNext(root);
 }
 
@@ -193,7 +197,7 @@ void WatchSet::Stop(Root& root) {
 
 void WatchSet::TryNext(Root& root) {
   const std::string& path = root.watch.path;
-  const bool is_remote = mounts_.NetworkMountOf(path) != 0 || KOVAFSIsRemoteFS(KOVAGetFSType(path.c_str(), 0)) == 1;
+  const bool is_remote = mounts_.IsNetwork(root.mount.id) || KOVAFSIsRemoteFS(KOVAGetFSType(path.c_str(), 0)) == 1;
   for (; root.way < ways_.size(); ++root.way) {
     const Way& way = ways_[root.way];
     if (way.watcher != nullptr && !is_remote) {

@@ -238,10 +238,11 @@ TEST(MountTableTest, TellsWhatLiesOnWhatAndWhatIsBehindANetwork) {
   EXPECT_EQ(table.Find(32).beneath, (std::vector<uint64_t>{31, 20}));
   EXPECT_TRUE(table.IsMounted(table.Find(32)));
   EXPECT_FALSE(table.IsMounted({31, "8:9 / /srv/other"})) << "its number was given to another one";
-  EXPECT_EQ(table.NetworkMountOf("/srv/my files/a"), 31);
-  for (const char* path : {"/srv/my files/local/a", "/srv/my filesystem", "/srv", "/"}) {
-    EXPECT_EQ(table.NetworkMountOf(path), 0) << path;
-  }
+  const std::pair<const char*, uint64_t> kPaths[] = {
+      {"/srv/my files/a", 31}, {"/srv/my files/local/a", 32}, {"/srv/my filesystem", 20}, {"/", 20}};
+  for (const auto& [path, id] : kPaths) EXPECT_EQ(table.MountOf(path), id) << path;
+  EXPECT_TRUE(table.IsNetwork(31));
+  EXPECT_FALSE(table.IsNetwork(32));
 }
 
 class MountTest : public WatchSetTest {
