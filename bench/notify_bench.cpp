@@ -31,11 +31,11 @@
 #include <vector>
 
 #include "common/unique_fd.h"
-#include "services/kovanotifyd/fan_inode_port.h"
-#include "services/kovanotifyd/filesystem_watcher.h"
-#include "services/kovanotifyd/folder_watcher.h"
-#include "services/kovanotifyd/inotify_port.h"
-#include "services/kovanotifyd/queue_router.h"
+#include "services/kovanotifyd/filesystem/filesystem_watcher.h"
+#include "services/kovanotifyd/folders/fan_inode_port.h"
+#include "services/kovanotifyd/folders/folder_watcher.h"
+#include "services/kovanotifyd/folders/inotify_port.h"
+#include "services/kovanotifyd/queues/queue_router.h"
 #include "services/kovanotifyd/watcher.h"
 
 namespace {

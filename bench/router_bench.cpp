@@ -21,7 +21,7 @@
 
 #include <benchmark/benchmark.h>
 
-#include "services/kovanotifyd/queue_router.h"
+#include "services/kovanotifyd/queues/queue_router.h"
 
 namespace {
 

@@ -17,9 +17,9 @@
 #include <string>
 #include <vector>
 
-#include "services/kovanotifyd/fan_inode_port.h"
-#include "services/kovanotifyd/folder_watcher.h"
-#include "services/kovanotifyd/inotify_port.h"
+#include "services/kovanotifyd/folders/fan_inode_port.h"
+#include "services/kovanotifyd/folders/folder_watcher.h"
+#include "services/kovanotifyd/folders/inotify_port.h"
 
 namespace {
 

@@ -12,10 +12,10 @@
 
 #include "common/unique_fd.h"
 #include "services/kovanotifyd/cookie.h"
-#include "services/kovanotifyd/queue_router.h"
+#include "services/kovanotifyd/queues/queue_router.h"
 #include "services/kovanotifyd/registry.h"
+#include "services/kovanotifyd/roots/watch_set.h"
 #include "services/kovanotifyd/sync_rounds.h"
-#include "services/kovanotifyd/watch_set.h"
 
 namespace ferrox::notifyd {
 

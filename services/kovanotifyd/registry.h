@@ -6,7 +6,7 @@
 #include <vector>
 
 #include "common/unique_fd.h"
-#include "services/kovanotifyd/queue_router.h"
+#include "services/kovanotifyd/queues/queue_router.h"
 
 namespace ferrox::notifyd {
 

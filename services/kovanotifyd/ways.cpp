@@ -5,10 +5,10 @@
 
 #include "common/file_util.h"
 #include "common/paths.h"
-#include "services/kovanotifyd/fan_inode_port.h"
-#include "services/kovanotifyd/filesystem_watcher.h"
-#include "services/kovanotifyd/folder_watcher.h"
-#include "services/kovanotifyd/inotify_port.h"
+#include "services/kovanotifyd/filesystem/filesystem_watcher.h"
+#include "services/kovanotifyd/folders/fan_inode_port.h"
+#include "services/kovanotifyd/folders/folder_watcher.h"
+#include "services/kovanotifyd/folders/inotify_port.h"
 #include "services/support/daemon.h"
 
 namespace ferrox::notifyd {

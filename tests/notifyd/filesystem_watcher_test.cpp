@@ -1,4 +1,4 @@
-#include "services/kovanotifyd/filesystem_watcher.h"
+#include "services/kovanotifyd/filesystem/filesystem_watcher.h"
 
 #include <fcntl.h>
 #include <sched.h>

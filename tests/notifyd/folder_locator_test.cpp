@@ -1,4 +1,4 @@
-#include "services/kovanotifyd/folder_locator.h"
+#include "services/kovanotifyd/filesystem/folder_locator.h"
 
 #include <deque>
 #include <iterator>
@@ -10,7 +10,7 @@
 
 #include <gtest/gtest.h>
 
-#include "services/kovanotifyd/rename_history.h"
+#include "services/kovanotifyd/filesystem/rename_history.h"
 
 namespace ferrox::notifyd {
 namespace {

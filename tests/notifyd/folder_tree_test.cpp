@@ -1,4 +1,4 @@
-#include "services/kovanotifyd/folder_tree.h"
+#include "services/kovanotifyd/folders/folder_tree.h"
 
 #include <map>
 #include <random>

@@ -1,4 +1,4 @@
-#include "services/kovanotifyd/folder_watcher.h"
+#include "services/kovanotifyd/folders/folder_watcher.h"
 
 #include <fcntl.h>
 #include <stdio.h>
@@ -18,8 +18,8 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
-#include "services/kovanotifyd/fan_inode_port.h"
-#include "services/kovanotifyd/inotify_port.h"
+#include "services/kovanotifyd/folders/fan_inode_port.h"
+#include "services/kovanotifyd/folders/inotify_port.h"
 #include "tests/notifyd/watcher_recorder.h"
 #include "tests/support/temp_dir.h"
 

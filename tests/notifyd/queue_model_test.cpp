@@ -9,8 +9,8 @@
 
 #include "fileindex/optree.h"
 #include "fileindex/queue_mgr.h"
-#include "services/kovanotifyd/folder_cover.h"
-#include "services/kovanotifyd/queue_router.h"
+#include "services/kovanotifyd/queues/folder_cover.h"
+#include "services/kovanotifyd/queues/queue_router.h"
 #include "tests/support/temp_dir.h"
 
 namespace ferrox::notifyd {

@@ -1,4 +1,4 @@
-#include "services/kovanotifyd/queue_router.h"
+#include "services/kovanotifyd/queues/queue_router.h"
 
 #include <sys/resource.h>
 

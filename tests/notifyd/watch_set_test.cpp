@@ -1,4 +1,4 @@
-#include "services/kovanotifyd/watch_set.h"
+#include "services/kovanotifyd/roots/watch_set.h"
 
 #include <sys/mount.h>
 
@@ -6,7 +6,7 @@
 
 #include <gtest/gtest.h>
 
-#include "services/kovanotifyd/watch_roots.h"
+#include "services/kovanotifyd/roots/watch_roots.h"
 #include "tests/contract/in_child.h"
 #include "tests/notifyd/fake_watcher.h"
 #include "tests/support/temp_dir.h"

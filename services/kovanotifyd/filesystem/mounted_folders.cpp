@@ -1,0 +1,166 @@
+#include "services/kovanotifyd/filesystem/mounted_folders.h"
+
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <sys/syscall.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <cstdio>
+#include <cstring>
+
+#include "common/file_util.h"
+
+namespace ferrox::notifyd {
+
+namespace {
+
+constexpr int kOpenFolder = O_RDONLY | O_DIRECTORY | O_CLOEXEC;
+
+struct Standing {
+  bool is_top = false;
+  bool is_removed = false;
+};
+
+/// False with errno set.
+bool ReadStanding(int folder, Standing& standing) {
+  struct statx figures = {};
+  if (statx(folder, "", AT_EMPTY_PATH | AT_STATX_DONT_SYNC, STATX_NLINK, &figures) != 0) return false;
+  standing.is_top = (figures.stx_attributes & STATX_ATTR_MOUNT_ROOT) != 0;
+  standing.is_removed = figures.stx_nlink == 0;
+  return true;
+}
+
+/// The number of the mount that the folder is on; 0 where the kernel does not tell.
+uint64_t MountOf(const std::string& path) {
+  struct statx figures = {};
+  constexpr unsigned kMountId = 0x1000;  // STATX_MNT_ID, newer than the headers of some hosts
+  if (statx(AT_FDCWD, path.c_str(), AT_SYMLINK_NOFOLLOW, kMountId, &figures) != 0) return 0;
+  return figures.stx_mnt_id;
+}
+
+/// The highest folder above `path` that is on the same mount: what may be renamed below it is no matter.
+std::string TopOfMount(std::string path) {
+  const uint64_t mount = MountOf(path);
+  while (mount != 0 && path != "/") {
+    const std::string above = Dirname(path).empty() ? "/" : Dirname(path);
+    if (MountOf(above) != mount) break;
+    path = above;
+  }
+  return path;
+}
+
+/// The last name of the folder's path. "" with errno set, also for a path that is longer than PATH_MAX.
+std::string NameOf(int folder) {
+  char link[32];
+  (void)snprintf(link, sizeof link, "/proc/self/fd/%d", folder);
+  char path[PATH_MAX];
+  const ssize_t size = readlink(link, path, sizeof path);
+  if (size <= 0) return {};
+  const std::string_view text(path, static_cast<size_t>(size));
+  return std::string(text.substr(text.rfind('/') + 1));
+}
+
+UniqueFd OpenAbove(int folder) {
+  UniqueFd above(openat(folder, "..", kOpenFolder | O_NOATIME));
+  return above.Valid() || errno != EPERM ? std::move(above) : UniqueFd(openat(folder, "..", kOpenFolder));
+}
+
+/// Returns when whoever was just changing names in the folder has done so and the kernel has queued the records: both
+/// happen under the folder's lock, which reading it takes too. That nothing fits into the buffer is no matter.
+void WaitForChangesUnderWay(int folder) {
+  char entry[8];
+  (void)syscall(SYS_getdents64, folder, entry, sizeof entry);
+}
+
+}  // namespace
+
+std::string MountedFolders::Add(const std::string& path, int folder, const HandleKey& key) {
+  const std::string top = TopOfMount(path);
+  auto anchor = std::find_if(anchors_.begin(), anchors_.end(), [&](const Anchor& known) {
+    return known.path == top && FanGroup::IsSameFileSystem(known.key, key);
+  });
+  if (anchor == anchors_.end()) anchor = anchors_.insert(anchor, Anchor{top, key});
+  if (!IsOpen(*anchor)) return "its mount cannot be opened";
+  struct stat there = {};
+  struct stat reached = {};
+  const UniqueFd again = FanGroup::OpenKey(key, anchor->fd.Get(), O_PATH | O_DIRECTORY);
+  if (!again.Valid() && errno == EPERM) return "opening folders by handle needs the capability CAP_DAC_READ_SEARCH";
+  if (!again.Valid()) return "the file system does not open folders by handle: " + std::string(strerror(errno));
+  if (fstat(folder, &there) != 0 || fstat(again.Get(), &reached) != 0 || there.st_dev != reached.st_dev ||
+      there.st_ino != reached.st_ino || NameOf(again.Get()).empty() != (path == "/")) {
+    return "the file system opens another folder by the handle";
+  }
+  return "";
+}
+
+void MountedFolders::Remove(const HandleKey& key) {
+  anchors_.erase(std::remove_if(anchors_.begin(), anchors_.end(),
+                                [&key](const Anchor& anchor) { return FanGroup::IsSameFileSystem(anchor.key, key); }),
+                 anchors_.end());
+}
+
+void MountedFolders::Close() {
+  for (Anchor& anchor : anchors_) anchor.fd.Reset();
+}
+
+/// Something else may be mounted at the path, or nothing any more.
+bool MountedFolders::IsOpen(Anchor& anchor) {
+  if (anchor.fd.Valid()) return true;
+  UniqueFd fd(open(anchor.path.c_str(), kOpenFolder));
+  if (!fd.Valid() || !FanGroup::IsSameFileSystem(group_.KeyOf(fd.Get()), anchor.key)) return false;
+  anchor.fd = std::move(fd);
+  return true;
+}
+
+UniqueFd MountedFolders::Open(const HandleKey& folder, int flags) {
+  errno = ENOENT;
+  for (Anchor& anchor : anchors_) {
+    if (!FanGroup::IsSameFileSystem(anchor.key, folder) || !IsOpen(anchor)) continue;
+    return FanGroup::OpenKey(folder, anchor.fd.Get(), flags);
+  }
+  return UniqueFd();
+}
+
+/// Of what one mount does not show, or shows as its top, another may show what is above.
+FolderSource::Answer MountedFolders::ReadPlace(const HandleKey& folder, FolderPlace& place) {
+  FolderSource::Answer answer = FolderSource::Answer::kNowhere;
+  for (Anchor& anchor : anchors_) {
+    if (!FanGroup::IsSameFileSystem(anchor.key, folder) || !IsOpen(anchor)) continue;
+    const FolderSource::Answer seen = ReadPlaceBy(anchor.fd.Get(), folder, place);
+    if (seen == FolderSource::Answer::kPlace || seen == FolderSource::Answer::kFailed) return seen;
+    if (seen == FolderSource::Answer::kTop) answer = seen;
+  }
+  return answer;
+}
+
+FolderSource::Answer MountedFolders::ReadPlaceBy(int mount, const HandleKey& folder, FolderPlace& place) {
+  const auto failure = [] {
+    const bool is_gone = errno == ESTALE || errno == ENOENT || errno == ENAMETOOLONG;
+    return is_gone ? FolderSource::Answer::kNowhere : FolderSource::Answer::kFailed;
+  };
+  Standing standing;
+  const UniqueFd fd = FanGroup::OpenKey(folder, mount, O_PATH | O_DIRECTORY);
+  if (!fd.Valid() || !ReadStanding(fd.Get(), standing)) return failure();
+  if (standing.is_top) return FolderSource::Answer::kTop;
+  const UniqueFd above = OpenAbove(fd.Get());
+  if (!above.Valid()) return failure();
+  place.parent = group_.KeyOf(above.Get(), folder);
+  place.name = NameOf(fd.Get());
+  if (place.parent.empty() || place.name.empty()) return failure();
+  WaitForChangesUnderWay(above.Get());
+  // Asked last, since the name of what is removed has an ending of the kernel's.
+  if (!ReadStanding(fd.Get(), standing)) return failure();
+  if (standing.is_removed || place.parent == folder) return FolderSource::Answer::kNowhere;
+  return FolderSource::Answer::kPlace;
+}
+
+std::optional<bool> MountedFolders::HasName(const HandleKey& folder, std::string_view name) {
+  const UniqueFd fd = Open(folder, O_PATH | O_DIRECTORY);
+  if (!fd.Valid()) return {};
+  struct stat found = {};
+  return fstatat(fd.Get(), std::string(name).c_str(), &found, AT_SYMLINK_NOFOLLOW) == 0;
+}
+
+}  // namespace ferrox::notifyd

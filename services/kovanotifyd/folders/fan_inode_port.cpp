@@ -1,0 +1,102 @@
+#include "services/kovanotifyd/folders/fan_inode_port.h"
+
+#include <fcntl.h>
+
+#include <cerrno>
+#include <fstream>
+#include <utility>
+
+namespace ferrox::notifyd {
+
+namespace {
+
+using Kind = FolderRecord::Kind;
+
+constexpr const char* kLimitFile = "/proc/sys/fs/fanotify/max_user_marks";
+constexpr auto kScope = FanGroup::Scope::kFolder;
+constexpr uint64_t kPlaceMask = FAN_MOVE_SELF | FAN_DELETE_SELF | FAN_ONDIR;
+constexpr uint64_t kAllMask =
+    kPlaceMask | FAN_CREATE | FAN_DELETE | FAN_RENAME | FAN_MODIFY | FAN_CLOSE_WRITE | FAN_ATTRIB | FAN_EVENT_ON_CHILD;
+
+uint64_t MaskOf(FolderPort::Wanted wanted) {
+  if (wanted == FolderPort::Wanted::kAll) return kAllMask;
+  return wanted == FolderPort::Wanted::kPlace ? kPlaceMask : FAN_ATTRIB | FAN_EVENT_ON_CHILD;
+}
+
+/// 64 bits of the handle's hash: of a million folders, two would have the same once in 40 million hosts.
+FolderKey Shorten(const HandleKey& handle) {
+  if (handle.empty()) return 0;
+  uint64_t hash = 0xCBF29CE484222325U;
+  for (const char byte : handle) {
+    hash = (hash ^ static_cast<unsigned char>(byte)) * 0x100000001B3U;
+    hash ^= hash >> 29;
+  }
+  return hash == 0 ? 1 : hash;
+}
+
+/// The changes that the kernel has joined in one record, in the order in which most of them come.
+void AddRecords(const FanRecord& record, std::vector<FolderRecord>& records) {
+  constexpr uint64_t kBoth = FAN_CREATE | FAN_DELETE;
+  constexpr struct {
+    uint64_t bits;
+    Kind kind;
+  } kKinds[] = {{kBoth, Kind::kUnsure},
+                {FAN_CREATE, Kind::kCreated},
+                {FAN_MODIFY, Kind::kModified},
+                {FAN_CLOSE_WRITE, Kind::kWritten},
+                {FAN_ATTRIB, Kind::kAttributes},
+                {FAN_DELETE, Kind::kDeleted},
+                {FAN_MOVE_SELF, Kind::kSelfMoved},
+                {FAN_DELETE_SELF, Kind::kSelfGone}};
+  const std::string_view name = record.name == "." ? std::string_view() : record.name;
+  const FolderKey folder = Shorten(record.folder.empty() ? record.target : record.folder);
+  if ((record.mask & FAN_RENAME) != 0) {
+    records.push_back({Kind::kRenamed, record.IsFolder(), Shorten(record.new_folder), record.new_name,
+                       Shorten(record.folder), record.name});
+  }
+  uint64_t mask = record.mask;
+  for (const auto& row : kKinds) {
+    if ((mask & row.bits) != row.bits) continue;
+    records.push_back({row.kind, record.IsFolder(), folder, name, 0, {}});
+    mask &= ~row.bits;
+  }
+}
+
+}  // namespace
+
+FolderPort::Limit FanInodePort::WatchLimit() const {
+  Limit limit{0, "fs.fanotify.max_user_marks"};
+  std::ifstream(kLimitFile) >> limit.watches;
+  return limit;
+}
+
+int FanInodePort::Watch(int folder, Wanted wanted, FolderKey& key) {
+  const HandleKey handle = group_.KeyOf(folder);
+  if (handle.empty()) return errno;
+  key = Shorten(handle);
+  return group_.Mark(folder, kScope, MaskOf(wanted));
+}
+
+std::string FanInodePort::Reason(int error) const { return FanGroup::Reason(error, kScope); }
+
+void FanInodePort::Unwatch(FolderKey key, const std::string& path) {
+  const UniqueFd folder(open(path.c_str(), O_PATH | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
+  if (!folder.Valid() || Shorten(group_.KeyOf(folder.Get())) != key)
+    return;  // elsewhere by now: its records are dropped
+  (void)group_.Unmark(folder.Get(), kScope, kAllMask);
+}
+
+bool FanInodePort::Read(std::vector<FolderRecord>& records) {
+  records.clear();
+  if (group_.Read(batch_) != 0) return false;
+  for (const FanRecord& record : batch_.records) {
+    if (record.IsOverflow()) {
+      records.push_back({});
+    } else {
+      AddRecords(record, records);
+    }
+  }
+  return true;
+}
+
+}  // namespace ferrox::notifyd

@@ -1,0 +1,31 @@
+#pragma once
+
+#include <string>
+#include <vector>
+
+#include "services/kovanotifyd/fan_group.h"
+#include "services/kovanotifyd/folders/folder_port.h"
+
+namespace ferrox::notifyd {
+
+/// A mark of fanotify for each folder: what needs no privileges.
+class FanInodePort : public FolderPort {
+ public:
+  /// `group` is open and has no marks.
+  explicit FanInodePort(FanGroup group) : group_(std::move(group)) {}
+
+  const char* Name() const override { return "fanotify inode marks"; }
+  Limit WatchLimit() const override;
+  int Fd() const override { return group_.Fd(); }
+  int Watch(int folder, Wanted wanted, FolderKey& key) override;
+  std::string Reason(int error) const override;
+  void Unwatch(FolderKey key, const std::string& path) override;
+  bool UnwatchesByPath() const override { return true; }
+  bool Read(std::vector<FolderRecord>& records) override;
+
+ private:
+  FanGroup group_;
+  FanBatch batch_;
+};
+
+}  // namespace ferrox::notifyd

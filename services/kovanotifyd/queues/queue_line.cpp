@@ -1,0 +1,47 @@
+#include "services/kovanotifyd/queues/queue_line.h"
+
+#include <algorithm>
+
+namespace ferrox::notifyd {
+
+namespace {
+
+bool NeedsEscape(char c) { return static_cast<unsigned char>(c) < 0x20 || c == '"' || c == '\\'; }
+
+void AppendEscaped(std::string& text, char c) {
+  constexpr char kHex[] = "0123456789abcdef";
+  text += '\\';
+  if (c == '"' || c == '\\') {
+    text += c;
+  } else {
+    text += "u00";
+    text += kHex[static_cast<unsigned char>(c) >> 4];
+    text += kHex[c & 0xf];
+  }
+}
+
+void AppendText(std::string& text, std::string_view value) {
+  while (true) {
+    const auto special = std::find_if(value.begin(), value.end(), NeedsEscape);
+    const auto plain = static_cast<size_t>(special - value.begin());
+    text.append(value.data(), plain);
+    if (plain == value.size()) return;
+    AppendEscaped(text, *special);
+    value.remove_prefix(plain + 1);
+  }
+}
+
+}  // namespace
+
+void AppendQueueLine(std::string& text, uint32_t event, bool is_folder, std::string_view path,
+                     std::string_view path_old) {
+  text += "{\"event\":";
+  text += std::to_string(event);
+  text += is_folder ? ",\"is_dir\":true,\"path\":\"" : ",\"is_dir\":false,\"path\":\"";
+  AppendText(text, path);
+  text += "\",\"path_old\":\"";
+  AppendText(text, path_old);
+  text += "\",\"data\":null}\n";
+}
+
+}  // namespace ferrox::notifyd

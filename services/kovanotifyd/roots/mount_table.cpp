@@ -1,0 +1,94 @@
+#include "services/kovanotifyd/roots/mount_table.h"
+
+#include <fcntl.h>
+
+#include <algorithm>
+#include <fstream>
+#include <iterator>
+#include <sstream>
+
+#include "services/kovanotifyd/roots/watch_roots.h"
+
+namespace ferrox::notifyd {
+
+namespace {
+
+/// File systems that ask another machine for everything.
+constexpr const char* kNetworkTypes[] = {"nfs",  "nfs4", "cifs",   "smb3",       "ceph",          "afs",
+                                         "coda", "9p",   "lustre", "fuse.sshfs", "fuse.glusterfs"};
+
+/// Blanks, tabs, newlines and backslashes stand as "\040" and so on.
+std::string Unescape(const std::string& text) {
+  std::string plain;
+  for (size_t i = 0; i < text.size(); ++i) {
+    if (text[i] == '\\' && i + 3 < text.size()) {
+      plain += static_cast<char>((text[i + 1] - '0') * 64 + (text[i + 2] - '0') * 8 + (text[i + 3] - '0'));
+      i += 3;
+    } else {
+      plain += text[i];
+    }
+  }
+  return plain;
+}
+
+}  // namespace
+
+MountTable::MountTable(const char* path) : path_(path), fd_(open(path, O_RDONLY | O_CLOEXEC)) { Read(); }
+
+/// "36 35 98:0 /root /mount/point options [more]... - ext4 source options"; the options may change.
+void MountTable::Read() {
+  lines_.clear();
+  std::ifstream table(path_);
+  for (std::string text; std::getline(table, text);) {
+    std::istringstream fields(text);
+    uint64_t id = 0;
+    Line line;
+    std::string device, root, point;
+    if (!(fields >> id >> line.parent >> device >> root >> point)) continue;
+    line.entry = device + " " + root + " " + point;
+    line.point = Unescape(point);
+    std::string type;
+    const size_t separator = text.find(" - ");
+    if (separator != std::string::npos)
+      type = text.substr(separator + 3, text.find(' ', separator + 3) - separator - 3);
+    line.is_network = std::find(std::begin(kNetworkTypes), std::end(kNetworkTypes), type) != std::end(kNetworkTypes);
+    lines_[id] = std::move(line);
+  }
+}
+
+Mount MountTable::Find(uint64_t id) const {
+  Mount mount = {id};
+  for (auto line = lines_.find(id); line != lines_.end() && mount.beneath.size() <= lines_.size();
+       line = lines_.find(line->second.parent)) {
+    if (line->first == id) {
+      mount.entry = line->second.entry;
+    } else {
+      mount.beneath.push_back(line->first);
+    }
+    if (line->second.parent == line->first) break;
+  }
+  return mount;
+}
+
+bool MountTable::IsMounted(const Mount& mount) const {
+  const auto line = lines_.find(mount.id);
+  return line != lines_.end() && line->second.entry == mount.entry;
+}
+
+uint64_t MountTable::MountOf(const std::string& path) const {
+  uint64_t nearest = 0;
+  size_t depth = 0;
+  for (const auto& [id, line] : lines_) {
+    if (line.point.size() < depth || !IsAtOrBelow(path, line.point)) continue;
+    depth = line.point.size();
+    nearest = id;
+  }
+  return nearest;
+}
+
+bool MountTable::IsNetwork(uint64_t id) const {
+  const auto line = lines_.find(id);
+  return line != lines_.end() && line->second.is_network;
+}
+
+}  // namespace ferrox::notifyd
