@@ -227,6 +227,11 @@ milliseconds ShareWorker::OnFailure(const Error& error) {
     status_.SetState(ShareStatus::State::kWaitingForEngine, error.what());
     return NextDelay(milliseconds(500), seconds(2));
   }
+  if (error.Code() == Error::kEngineStorage && delay_.count() == 0) {
+    // An engine that was killed says once that what it had not committed has to be sent again.
+    status_.SetState(ShareStatus::State::kWaitingForEngine, error.what());
+    return NextDelay(milliseconds(100), seconds(2));
+  }
   Tell(ShareStatus::State::kError, std::string(error.what()) + " (" + std::to_string(error.Code()) + ")");
   return NextDelay(seconds(2), seconds(300));
 }

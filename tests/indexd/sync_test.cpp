@@ -74,6 +74,17 @@ TEST_F(SyncTest, ChangesThatNeverEndAreNotWaitedFor) {
   index->before_write = nullptr;
 }
 
+TEST_F(SyncTest, WhatAKilledEngineLostIsSentAgainMeanwhile) {
+  std::atomic<bool> failed{false};
+  index->before_write = [&failed](const std::string&) {
+    if (!failed.exchange(true)) throw Error(Error::kEngineStorage, "send them again");
+  };
+  Change("f");
+  EXPECT_EQ("", Sync());
+  EXPECT_EQ(Expected(), Indexed());
+  index->before_write = nullptr;
+}
+
 TEST_F(SyncTest, ReasonIsTold) {
   const auto fail_with = [this](Error::ErrorCode code) {
     index->before_write = [code](const std::string&) { throw Error(code, "the reason"); };
