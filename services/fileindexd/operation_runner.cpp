@@ -52,7 +52,8 @@ OperationRunner::OperationRunner(const PassContext& context)
       tasks_(context.pool, context.interruption),
       gone_trees_(tasks_, writer_, true),
       gone_(tasks_, writer_, false),
-      tail_(context_.queue_path) {}
+      tail_(context_.queue_path),
+      ahead_before_(context_.written_ahead) {}
 
 void OperationRunner::Run(const std::function<void(const std::function<void(const fileindex::OP&)>&)>& each,
                           const std::vector<std::string>& also_compare) {
@@ -67,6 +68,7 @@ void OperationRunner::Run(const std::function<void(const std::function<void(cons
     context_.status.OperationDone();
   });
   for (const std::string& path : also_compare) CompareOnce(path);
+  LookAtWrittenAhead();
   tasks_.Wait();
   RefreshSuspects();
   Commit();
@@ -110,13 +112,17 @@ void OperationRunner::CommitIfDue() {
 
 /// While a long pass goes on, files that change meanwhile are written, too, so that they are found soon. Only that:
 /// their lines stay in the queue, whose pass carries them out again in its turn and decides, so that it does not matter
-/// what the present pass knew of these files.
+/// what the present pass knew of these files. What is very much is left to that pass.
 void OperationRunner::KeepUp() {
   if (std::chrono::steady_clock::now() - kept_up_ < context_.keep_up_interval) return;
+  constexpr size_t kAheadMax = 20000;
+  if (ahead_.size() > kAheadMax) return;
   struct stat status = {};
   bool any = false;
   for (const std::string& path : tail_.NextChangedFiles()) {
     if (LookAt(path, status) != Presence::kThere || !rules_.CanBeIndexed(path)) continue;
+    ahead_.insert(path);
+    context_.written_ahead.insert(path);
     tasks_.Submit([this, path] { writer_.Write(path); });
     any = true;
   }
@@ -125,6 +131,17 @@ void OperationRunner::KeepUp() {
     Commit();
   }
   kept_up_ = std::chrono::steady_clock::now();
+}
+
+/// Folding drops the delete of a file where the folder that it was in is a file now, since nothing in that folder could
+/// have been indexed, if it were not for this.
+void OperationRunner::LookAtWrittenAhead() {
+  struct stat status = {};
+  for (const std::string& path : ahead_before_) {
+    if (LookAt(path, status) == Presence::kGone) gone_.Add(path);
+  }
+  gone_.Flush();
+  context_.written_ahead = ahead_;
 }
 
 void OperationRunner::Commit() {

@@ -37,6 +37,8 @@ struct PassContext {
   const HeldFolder& held;  ///< the share's folder
   const std::string& queue_path;
   std::chrono::milliseconds keep_up_interval;
+  /// Files that a pass wrote ahead of the pass that has their lines, which looks at them again. Kept by the worker.
+  std::set<std::string>& written_ahead;
 };
 
 /// Carries the operations of one pass into the index, in two stages: first what removes and moves documents, in the
@@ -85,6 +87,7 @@ class OperationRunner {
   void FinishMoves();
   void CommitIfDue();
   void KeepUp();
+  void LookAtWrittenAhead();
   void Commit();
 
   bool BecameReadable(const std::string& folder);
@@ -108,6 +111,8 @@ class OperationRunner {
   RemovalBatch gone_trees_;
   RemovalBatch gone_;
   QueueTail tail_;
+  const std::set<std::string> ahead_before_;  ///< written ahead of this pass
+  std::set<std::string> ahead_;               ///< by this pass
   std::set<std::string> compared_;
   bool had_reindex_ = false;
   std::chrono::steady_clock::time_point last_commit_ = std::chrono::steady_clock::now();

@@ -406,7 +406,7 @@ void ShareWorker::RunPass() {
   // Only now: of folders that are changed later, the events are in a later queue.
   const ShareFolders folders = LoadFolders();
   OperationRunner runner({share_, root_, folders, *index_, environment_.pool, interruption_, status_, held, queue_path_,
-                          environment_.keep_up_interval});
+                          environment_.keep_up_interval, written_ahead_});
   RunOperations(queue, runner, folders);
   // What went away in the meantime, with its volume for example, looked as if it had been deleted.
   runner.CheckRoot();

@@ -6,6 +6,7 @@
 #include <functional>
 #include <memory>
 #include <optional>
+#include <set>
 #include <string>
 #include <thread>
 
@@ -131,6 +132,7 @@ class ShareWorker {
   bool strays_looked_for_ = false;
   AppliedFolders applied_;
   std::optional<std::chrono::steady_clock::time_point> awaits_since_;
+  std::set<std::string> written_ahead_;
   std::atomic<uint64_t> folder_count_{0};
   int last_failure_ = 0;
   std::chrono::steady_clock::time_point failing_since_;  ///< with that failure

@@ -69,6 +69,29 @@ TEST_F(ShareWorkerTest, FilesThatChangeDuringALongPassAreWrittenInIt) {
   EXPECT_EQ(2, index->upserts[At("aa")]) << "and again in their turn";
 }
 
+TEST_F(ShareWorkerTest, FileWrittenAheadDoesNotOutliveItsFolder) {
+  keep_up_interval = std::chrono::milliseconds(0);
+  worker = MakeWorker();
+  for (int i = 0; i < 300; ++i) test::WriteFile(At("f" + std::to_string(i)), "x");
+  int writes = 0;
+  index->before_write = [this, &writes](const std::string& path) {
+    if (path == At("b/x")) {
+      fs::remove_all(At("b"));
+      test::WriteFile(At("b"), "file again");
+      Queue(Line(kDelete, At("b/x")) + Line(kDelete, At("b"), "", true) + Line(kCreate, At("b")));
+    }
+    if (++writes != 20) return;
+    fs::create_directory(At("b"));
+    test::WriteFile(At("b/x"), "for a moment");
+    Queue(Line(kCreate, At("b")) + Line(kDelete, At("b")) + Line(kCreate, At("b"), "", true) +
+          Line(kCreate, At("b/x")));
+  };
+  fs::remove(queue_path);
+  Queue(Line(kReindex, root));
+  worker->RunOnce();
+  EXPECT_EQ(Expected(), Indexed());
+}
+
 TEST_F(ShareWorkerTest, ChangeUnderOneNameReachesTheOthers) {
   test::WriteFile(At("a"), "1");
   fs::create_directory(At("d"));
