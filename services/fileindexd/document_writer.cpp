@@ -49,8 +49,12 @@ void DocumentWriter::RefreshAttributes(const std::string& path) {
     status_.DocumentWritten();
   } catch (const Error& error) {
     if (error.Code() == Error::kEngineNoSuchDocument) return Write(path);
-    RecordFailure(error, path);
+    return RecordFailure(error, path);
   }
+  // Written to meanwhile, the document would have the stamp of the new content beside the text of the old.
+  struct stat now = {};
+  const bool still = LookAt(path, now) == Presence::kThere && SameContent(Stamp(now), Stamp(status));
+  if (!still) Write(path);
 }
 
 void DocumentWriter::RefreshRenamed(const std::string& path, const std::string& old_path) {

@@ -10,8 +10,6 @@ namespace ferrox::engine {
 
 namespace {
 
-constexpr char kStamp[] = "_KOVAStamp";
-
 /// 0: not known.
 int64_t FileOf(const std::string& stamp) {
   const size_t dot = stamp.rfind('.');

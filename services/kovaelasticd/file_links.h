@@ -14,11 +14,14 @@ namespace ferrox::engine {
 /// number behind the last "." of "_KOVAStamp"; folders have no other names.
 class FileLinks {
  public:
+  /// The member of a document that tells what was seen of its file.
+  static constexpr char kStamp[] = "_KOVAStamp";
+
   FileLinks(Database& database, const FieldNames& names) : database_(database), names_(names) {}
 
   /// Makes the tables where they are missing.
   void MakeTables();
-  /// A document is written (`before` null: it is new) or removed (`after` null).
+  /// A document is written behind a look at its file (`before` null: it is new) or removed (`after` null).
   void OnChange(int64_t id, const DocRow* before, const DocRow* after);
 
  private:

@@ -133,7 +133,8 @@ void SqliteStore::Set(const std::string& path, const Json::Value& changes) {
   Pending& pending = Touch(*before);
   UpdateRow(before->id, row, text_bytes);
   CountText(before->text_bytes, text_bytes);
-  links_.OnChange(before->id, &before->row, &row);
+  // A document that only moves was not looked at.
+  if (changes.isMember(FileLinks::kStamp)) links_.OnChange(before->id, &before->row, &row);
   pending.new_meta = MakeMetaText(row, document, *schema_);
   if (text_changed) {
     pending.text_changed = true;

@@ -66,13 +66,13 @@ TEST_F(IndexStoreTest, OtherNamesOfAChangedFileAreSuspects) {
   Reopen();
   EXPECT_EQ("/c|", suspects());
   Json::Value change;
-  change["_KOVAStamp"] = "1.1.3.77";
-  store_->Set("/c", change);
-  EXPECT_EQ("", suspects());
-  change = Json::Value();
   change["KOVAMDPath"] = "/moved";
   store_->Set("/c", change);
-  EXPECT_EQ("", suspects()) << "a name alone says nothing of the file";
+  EXPECT_EQ("/moved|", suspects()) << "a new name says nothing of the file";
+  change = Json::Value();
+  change["_KOVAStamp"] = "1.1.3.77";
+  store_->Set("/moved", change);
+  EXPECT_EQ("", suspects());
   store_->Delete("/moved");
   EXPECT_EQ("/a|/b|", suspects());
   Put(stamped("/a", "1.1.1.79"));

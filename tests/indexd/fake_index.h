@@ -47,6 +47,7 @@ class FakeIndex : public indexd::ShareIndex {
   }
 
   void Attr(const std::string& path) override {
+    if (before_attr) before_attr(path);
     const std::string stamp = StampOf(path);
     const std::lock_guard lock(mutex);
     (void)RequireDocument(path);
@@ -120,6 +121,7 @@ class FakeIndex : public indexd::ShareIndex {
   int lists = 0;
   int commits = 0;
   std::function<void(const std::string& path)> before_write;
+  std::function<void(const std::string& path)> before_attr;
 
  private:
   static std::string StampOf(const std::string& path) {

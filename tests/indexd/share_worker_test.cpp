@@ -69,6 +69,14 @@ TEST_F(ShareWorkerTest, FilesThatChangeDuringALongPassAreWrittenInIt) {
   EXPECT_EQ(2, index->upserts[At("aa")]) << "and again in their turn";
 }
 
+TEST_F(ShareWorkerTest, FileThatIsWrittenWhileItsAttributesAreReadKeepsNoOldText) {
+  test::WriteFile(At("f"), "old");
+  Process(Line(kCreate, At("f")));
+  index->before_attr = [](const std::string& path) { test::WriteFile(path, "new text"); };
+  Process(Line(kAttr, At("f")));
+  EXPECT_EQ(Expected(), Indexed());
+}
+
 TEST_F(ShareWorkerTest, FileWrittenAheadDoesNotOutliveItsFolder) {
   keep_up_interval = std::chrono::milliseconds(0);
   worker = MakeWorker();
