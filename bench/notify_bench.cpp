@@ -276,7 +276,9 @@ std::unique_ptr<Watcher> MakeInodeMarksWatcher(const std::string& cookie) {
 }
 
 std::unique_ptr<Watcher> MakeInotifyWatcher(const std::string& cookie) {
-  return MakeFolderWatcher(std::make_unique<ferrox::notifyd::InotifyPort>(), cookie);
+  auto port = std::make_unique<ferrox::notifyd::InotifyPort>();
+  if (const std::string problem = port->Open(); !problem.empty()) Die(problem);
+  return MakeFolderWatcher(std::move(port), cookie);
 }
 
 std::vector<Row> Rows() {
