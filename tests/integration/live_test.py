@@ -252,16 +252,19 @@ class LiveTest(unittest.TestCase):
         cases = ["LiveTest.test_changes_by_inode_marks", "LiveTest.test_changes_by_inotify",
                  "LiveTest.test_changes_by_periodic_scan", "LiveTest.test_default_way_is_the_best_there_is",
                  "LiveTest.test_unreadable_folder_is_watched_again_when_it_can_be_read"]
+        python = shutil.which("python3", path="/usr/bin:/bin") or sys.executable
         with tempfile.TemporaryDirectory() as folder:  # the programs, where such a user can reach them
             os.chmod(folder, 0o755)
             programs = os.environ["FERROX_BIN"]
             for program in ("fileindexctl", "kovaelasticd", "kovanotifyd", "fileindexd"):
                 shutil.copy(f"{programs}/{program}", folder)
+            shutil.copytree(f"{programs}/../lib", f"{folder}/lib", ignore=shutil.ignore_patterns("*.a"))
             for script in ("instance.py", "live.py", "live_test.py"):
                 shutil.copy(os.path.join(os.path.dirname(os.path.abspath(__file__)), script), folder)
-            done = subprocess.run([shutil.which("python3", path="/usr/bin:/bin") or sys.executable, "-B", f"{folder}/live_test.py", *cases], user=NOBODY, group=NOBODY,
-                                  extra_groups=[], env=dict(os.environ, FERROX_BIN=folder), cwd="/", timeout=200,
-                                  capture_output=True, check=False)
+            environment = dict(os.environ, FERROX_BIN=folder, LD_LIBRARY_PATH=f"{folder}/lib")
+            done = subprocess.run([python, "-B", f"{folder}/live_test.py", *cases], user=NOBODY, group=NOBODY,
+                                  extra_groups=[], env=environment, cwd="/", timeout=200, capture_output=True,
+                                  check=False)
         self.assertEqual(0, done.returncode, done.stderr.decode(errors="replace"))
 
     def test_default_way_is_the_best_there_is(self):

@@ -71,6 +71,7 @@ Mount MountTable::Find(uint64_t id) const {
 }
 
 bool MountTable::IsMounted(const Mount& mount) const {
+  if (mount.entry.empty()) return true;  // it never was in the table, as that of a changed root is not
   const auto line = lines_.find(mount.id);
   return line != lines_.end() && line->second.entry == mount.entry;
 }
