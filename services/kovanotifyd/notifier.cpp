@@ -207,7 +207,7 @@ void Notifier::OnChange(Change change) {
   router_.Put(change, SteadyClock::now());
 }
 
-void Notifier::OnCompare(const std::string& path) { router_.PutComparison(path, SteadyClock::now()); }
+void Notifier::OnCompare(const std::string& path) { router_.PutComparison(path); }
 
 void Notifier::OnLost(size_t way) {
   ++lost_;

@@ -179,7 +179,7 @@ QueueRouter::~QueueRouter() = default;
 
 void QueueRouter::SetQueues(const std::map<std::string, std::vector<QueueWatch>>& queues) { impl_->SetQueues(queues); }
 void QueueRouter::Put(const Change& change, TimePoint now) { impl_->Put(change, now); }
-void QueueRouter::PutComparison(const std::string& path, TimePoint) { impl_->PutComparison(path); }
+void QueueRouter::PutComparison(const std::string& path) { impl_->PutComparison(path); }
 QueueRouter::TimePoint QueueRouter::Flush(TimePoint now) { return impl_->Flush(now); }
 std::string QueueRouter::FlushAll(TimePoint now) { return impl_->FlushAll(now); }
 std::map<std::string, QueueFigures> QueueRouter::Figures() const { return impl_->Figures(); }

@@ -58,7 +58,7 @@ class QueueRouter {
   void Put(const Change& change, TimePoint now);
   /// Asks for the comparison of disk and index at and below a path, in each queue that watches it or something below
   /// it; in the latter case, of what it watches. Also where the mask says nothing of it: changes may have been lost.
-  void PutComparison(const std::string& path, TimePoint now);
+  void PutComparison(const std::string& path);
 
   /// Appends what is due. Returns when something else will be, or TimePoint::max().
   TimePoint Flush(TimePoint now);
