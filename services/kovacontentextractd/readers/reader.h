@@ -1,0 +1,71 @@
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <string>
+#include <string_view>
+
+#include <json/value.h>
+
+/// Readers get text and metadata out of one file. They run in a worker without file system and without rights: all they
+/// have is the open file. They may be given anything, and must not trust a byte of it; what the kernel enforces on the
+/// worker (memory, time) is the last line, not the first.
+namespace ferrox::extract {
+
+/// What bounds every reader.
+struct Limits {
+  size_t text_bytes = 1U << 20;         ///< of text that is kept
+  uint64_t expansion_free = 1U << 20;   ///< unpacked bytes that are never too many
+  uint64_t expansion_ratio = 100;       ///< beyond them, unpacked bytes for each packed one
+  uint64_t member_bytes = 50ULL << 20;  ///< of one member of an archive or container, unpacked
+  int nesting = 2;                      ///< of files in files
+};
+
+/// One file to read. The descriptor is open for reading, can seek, and is not the reader's to close.
+struct Source {
+  int fd = -1;
+  uint64_t size = 0;
+  std::string name = {};       ///< its last component, for hints; bytes
+  std::string extension = {};  ///< in lower case, without the dot
+  int depth = 0;               ///< how many files it is inside of
+};
+
+/// What was found, collected within the limits.
+class Findings {
+ public:
+  explicit Findings(const Limits& limits = {}) : limits_(limits) {}
+  const Limits& Bounds() const { return limits_; }
+
+  /// Adds text in UTF-8; what is not is replaced. Text beyond the limit is dropped and noted as cut. False when no more
+  /// is kept, so that a reader may stop.
+  bool AddText(std::string_view text);
+  /// Ends a line, paragraph, cell or page: the words before and behind do not touch.
+  void Break();
+
+  /// Metadata, by the names and types of the index schema. An empty text, and what is not finite, is not set. Set
+  /// replaces; Append joins several values of one field (authors, keywords) with ", ", each once.
+  void Set(const char* field, std::string_view value);
+  void Append(const char* field, std::string_view value);
+  void SetInteger(const char* field, int64_t value);
+  void SetNumber(const char* field, double value);
+
+  /// The reason why the content, or a part of it, could not be read, in a few words ("encrypted", "damaged",
+  /// "expands to too much"). The first one counts; what was found besides is kept.
+  void Fail(std::string_view reason);
+
+  bool HasText() const { return !text_.empty(); }
+  /// The document's members: the fields, "KOVAMDTextContent", "_KOVATextCut", "_KOVAExtractError".
+  Json::Value ToDocument() const;
+
+ private:
+  Limits limits_;
+  std::string text_;
+  bool cut_ = false;
+  std::string failure_;
+  Json::Value fields_ = Json::Value(Json::objectValue);
+};
+
+/// Reads one kind of file. Does not throw for anything that a file can hold.
+using Reader = void (*)(const Source& source, Findings& findings);
+
+}  // namespace ferrox::extract
