@@ -1,0 +1,106 @@
+#include <algorithm>
+#include <cmath>
+
+#include "services/kovacontentextractd/readers/reader.h"
+#include "services/kovacontentextractd/readers/utf8.h"
+
+namespace ferrox::extract {
+
+namespace {
+
+/// Of one field: titles and comments are shorter, and a file must not fill the answer with something else than text.
+constexpr size_t kFieldMaxBytes = 32U << 10;
+constexpr std::string_view kBetweenValues = ", ";
+constexpr std::string_view kReplacement = "\xEF\xBF\xBD";
+constexpr std::string_view kBlanks("\0 \t\r\n\v\f", 7);
+
+/// Appends with a replacement for each byte that is part of no character, and a blank for each zero.
+void AppendClean(std::string& out, std::string_view text) {
+  const size_t begin = out.size();
+  while (!text.empty()) {
+    const size_t valid = ValidUtf8Prefix(text);
+    out.append(text.substr(0, valid));
+    text.remove_prefix(valid);
+    if (text.empty()) break;
+    out.append(kReplacement);
+    text.remove_prefix(1);
+  }
+  std::replace(out.begin() + static_cast<ptrdiff_t>(begin), out.end(), '\0', ' ');
+}
+
+/// A field's value: clean, without blanks at either end, not too long.
+std::string FieldValue(std::string_view text) {
+  const size_t first = text.find_first_not_of(kBlanks);
+  if (first == std::string_view::npos) return {};
+  text = text.substr(first, text.find_last_not_of(kBlanks) + 1 - first);
+  std::string value;
+  AppendClean(value, CutAtCharacter(text, kFieldMaxBytes));
+  value.resize(CutAtCharacter(value, kFieldMaxBytes).size());
+  return value;
+}
+
+/// Whether `value` is one of the values that `joined` holds.
+bool Holds(std::string_view joined, std::string_view value) {
+  for (size_t at = joined.find(value); at != std::string_view::npos; at = joined.find(value, at + 1)) {
+    const std::string_view before = joined.substr(0, at), behind = joined.substr(at + value.size());
+    if ((before.empty() || before.ends_with(kBetweenValues)) &&
+        (behind.empty() || behind.starts_with(kBetweenValues))) {
+      return true;
+    }
+  }
+  return false;
+}
+
+}  // namespace
+
+bool Findings::AddText(std::string_view text) {
+  if (cut_) return false;
+  const size_t room = limits_.text_bytes - std::min(limits_.text_bytes, text_.size());
+  const std::string_view fitting = CutAtCharacter(text, room);
+  cut_ = fitting.size() < text.size();
+  AppendClean(text_, fitting);
+  if (text_.size() > limits_.text_bytes) {  // replacements are longer than what they replace
+    text_.resize(CutAtCharacter(text_, limits_.text_bytes).size());
+    cut_ = true;
+  }
+  return !cut_;
+}
+
+void Findings::Break() {
+  if (!text_.empty() && text_.back() != '\n' && text_.size() < limits_.text_bytes) text_ += '\n';
+}
+
+void Findings::Set(const char* field, std::string_view value) {
+  std::string clean = FieldValue(value);
+  if (!clean.empty()) fields_[field] = std::move(clean);
+}
+
+void Findings::Append(const char* field, std::string_view value) {
+  const Json::Value& present = fields_[field];
+  const std::string joined = present.isString() ? present.asString() : std::string();
+  const std::string added = FieldValue(value);
+  if (joined.empty()) return added.empty() ? (void)fields_.removeMember(field) : Set(field, added);
+  const bool fits = joined.size() + kBetweenValues.size() + added.size() <= kFieldMaxBytes;
+  if (added.empty() || !fits || Holds(joined, added)) return;
+  fields_[field] = joined + std::string(kBetweenValues) + added;
+}
+
+void Findings::SetInteger(const char* field, int64_t value) { fields_[field] = Json::Int64(value); }
+
+void Findings::SetNumber(const char* field, double value) {
+  if (std::isfinite(value)) fields_[field] = value;
+}
+
+void Findings::Fail(std::string_view reason) {
+  if (failure_.empty()) failure_ = FieldValue(reason);
+}
+
+Json::Value Findings::ToDocument() const {
+  Json::Value document = fields_;
+  if (!text_.empty()) document["KOVAMDTextContent"] = text_;
+  if (cut_) document["_KOVATextCut"] = true;
+  if (!failure_.empty()) document["_KOVAExtractError"] = failure_;
+  return document;
+}
+
+}  // namespace ferrox::extract
