@@ -1,7 +1,5 @@
 #include "common/paths.h"
 
-#include <algorithm>
-
 #include <kova/instance.h>
 
 namespace ferrox {
@@ -12,7 +10,7 @@ std::string InstanceRootProblem() {
   const std::string& root = kova::InstanceRoot();
   if (root.empty()) return {};
   if (root.front() != '/') return "FERROX_ROOT=" + root + " is not an absolute path; give one that begins with /";
-  const size_t longest = std::max(InstancePath(kElasticdSocket).size(), InstancePath(kFileIndexdSocket).size());
+  const size_t longest = InstancePath(kContentExtractdSocket).size();
   if (longest <= kSocketPathMaxBytes) return {};
   return "FERROX_ROOT=" + root + " is " + std::to_string(longest - kSocketPathMaxBytes) +
          " bytes too long: socket paths are limited to " + std::to_string(kSocketPathMaxBytes) +

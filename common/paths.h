@@ -18,6 +18,7 @@ FERROX_EXPORT std::string InstanceRootProblem();
 inline constexpr char kFileIndexdSocket[] = "/var/run/fileindexd.sock";
 inline constexpr char kElasticdSocket[] = "/var/run/kovaelasticd.sock";
 inline constexpr char kNotifydSocket[] = "/var/run/kovanotifyd.sock";
+inline constexpr char kContentExtractdSocket[] = "/var/run/kovacontentextractd.sock";
 inline constexpr char kConfigurationFolder[] = "/var/packages/Ferrox/etc";
 inline constexpr char kFileIndexFoldersCfgPath[] = "/var/packages/Ferrox/etc/fileindex.folders";
 inline constexpr char kFileIndexStatusCfgPath[] = "/var/packages/Ferrox/etc/fileindex.status";

@@ -6,11 +6,11 @@
 #include <string>
 #include <string_view>
 
-#include "platform/host/content/encoding.h"
-#include "platform/host/content/markup.h"
-#include "platform/host/content/utf8.h"
+#include "services/kovacontentextractd/readers/encoding.h"
+#include "services/kovacontentextractd/readers/markup.h"
+#include "services/kovacontentextractd/readers/utf8.h"
 
-using namespace kova::content;
+using namespace ferrox::extract;
 
 namespace {
 

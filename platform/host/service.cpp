@@ -17,7 +17,7 @@ constexpr ServiceRow kServices[] = {
     {"kovaelasticd", "kovaelasticd", "/var/run/kovaelasticd.sock", "kovaelasticd.service"},
     {"pkg-Ferrox-fileindexd", "fileindexd", "/var/run/fileindexd.sock", "fileindexd.service"},
     {"kovanotifyd", "kovanotifyd", "/var/run/kovanotifyd.sock", "kovanotifyd.service"},
-    {"kovacontentextractd", "kovacontentextractd", nullptr, "kovacontentextractd.service"},
+    {"kovacontentextractd", "kovacontentextractd", "/var/run/kovacontentextractd.sock", "kovacontentextractd.service"},
 };
 /// The file-sharing service is the host's own; an instance cannot switch it.
 constexpr ServiceRow kFileSharing = {"samba", nullptr, nullptr, "smbd.service"};

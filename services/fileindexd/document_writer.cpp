@@ -8,8 +8,20 @@
 
 namespace ferrox::indexd {
 
+using KOVA::CONTENT_EXTRACT::ExtractVersion;
 using KOVA::CONTENT_EXTRACT::SameContent;
 using KOVA::CONTENT_EXTRACT::Stamp;
+
+namespace {
+
+/// Whether the content may be readable that was not when the document was written. A file that broke its reader is not
+/// tried again by the same one.
+bool IsWorthAnotherTry(const IndexedEntry& indexed) {
+  return indexed.with_content && (indexed.extract_failed || indexed.extract_version == 0) &&
+         indexed.extract_version < ExtractVersion(indexed.content_type);
+}
+
+}  // namespace
 
 Presence LookAt(const std::string& path, struct stat& status) {
   if (lstat(path.c_str(), &status) == 0) return S_ISLNK(status.st_mode) ? Presence::kGone : Presence::kThere;
@@ -21,7 +33,8 @@ bool DocumentWriter::WantsContent(const std::string& path, const struct stat& st
 }
 
 bool DocumentWriter::IsCurrent(const IndexedEntry& indexed, const struct stat& status) const {
-  return indexed.stamp == Stamp(status) && indexed.with_content == WantsContent(indexed.path, status);
+  return indexed.stamp == Stamp(status) && indexed.with_content == WantsContent(indexed.path, status) &&
+         !IsWorthAnotherTry(indexed);
 }
 
 void DocumentWriter::Write(const std::string& path) {
@@ -64,10 +77,13 @@ void DocumentWriter::RefreshRenamed(const std::string& path, const std::string& 
   same_kind ? RefreshAttributes(path) : Write(path);
 }
 
-/// Called while an error is handled: goes on when it is the file's, passes it on when it is the engine's.
+/// Called while an error is handled: goes on when it is the file's, passes it on when it is the engine's, or that of
+/// content extraction as a whole.
 void DocumentWriter::RecordFailure(const Error& error, const std::string& path) {
   struct stat status = {};
   if (error.Code() == Error::kParseFailed) {
+    const std::string problem = KOVA::CONTENT_EXTRACT::ExtractionProblem();
+    if (!problem.empty()) throw Error(Error::kParseFailed, problem);
     if (LookAt(path, status) == Presence::kGone) return Remove(path);
     return status_.AddFailure("cannot be examined", path);
   }

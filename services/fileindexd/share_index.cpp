@@ -19,12 +19,18 @@ constexpr std::chrono::seconds kFiguresWait(2);
 constexpr char kPathField[] = "KOVAMDPath";
 constexpr char kStampField[] = "_KOVAStamp";
 constexpr char kNeedMetaField[] = "_KOVANeedMeta";
+constexpr char kTypeField[] = "KOVAMDContentType";
+constexpr char kVersionField[] = "_KOVAExtractVersion";
+constexpr char kErrorField[] = "_KOVAExtractError";
 
 IndexedEntry ToEntry(const Json::Value& fields) {
   IndexedEntry entry;
   GetJsonValue(entry.path, fields, kPathField, true);
   GetJsonValue(entry.stamp, fields, kStampField, false);
   GetJsonValue(entry.with_content, fields, kNeedMetaField, false);
+  GetJsonValue(entry.content_type, fields, kTypeField, false);
+  GetJsonValue(entry.extract_version, fields, kVersionField, false);
+  entry.extract_failed = fields.isMember(kErrorField);
   return entry;
 }
 
@@ -136,7 +142,9 @@ class Engine : public ShareIndex {
   }
 
   std::vector<IndexedEntry> Query(Json::Value query) const {
-    for (const char* field : {kPathField, kStampField, kNeedMetaField}) query["load_field"].append(field);
+    for (const char* field : {kPathField, kStampField, kNeedMetaField, kTypeField, kVersionField, kErrorField}) {
+      query["load_field"].append(field);
+    }
     Json::Value request = Request("document_get_by_query");
     request["data"]["query"] = std::move(query);
     Json::Value reply;

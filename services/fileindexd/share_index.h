@@ -13,6 +13,9 @@ struct IndexedEntry {
   std::string path;
   std::string stamp;
   bool with_content = false;  ///< whether its content was wanted when it was written
+  std::string content_type = {};
+  int extract_version = 0;      ///< of what read its content; 0: nothing did
+  bool extract_failed = false;  ///< its content, or a part of it, could not be read
 };
 
 /// One share's index, as the daemon's work needs it; every call may throw what the engine's commands do. Several

@@ -13,9 +13,15 @@ constexpr size_t kExamplesKept = 3;
 constexpr size_t kReasonsKept = 100;
 
 const char* StateName(ShareStatus::State state) {
-  constexpr const char* kNames[] = {
-      "starting",           "idle", "indexing", "paused", "waiting for space", "waiting for engine",
-      "waiting for volume", "error"};
+  constexpr const char* kNames[] = {"starting",
+                                    "idle",
+                                    "indexing",
+                                    "paused",
+                                    "waiting for space",
+                                    "waiting for engine",
+                                    "waiting for volume",
+                                    "waiting for content extraction",
+                                    "error"};
   return kNames[static_cast<int>(state)];
 }
 

@@ -37,6 +37,7 @@ class ShareStatus {
     kWaitingForSpace,
     kWaitingForEngine,
     kWaitingForVolume,
+    kWaitingForContent,
     kError
   };
 

@@ -222,6 +222,10 @@ milliseconds ShareWorker::OnFailure(const Error& error) {
     Tell(ShareStatus::State::kWaitingForEngine, "the search engine does not answer; start it with 'fileindexctl up'");
     return NextDelay(seconds(1), seconds(30));
   }
+  if (error.Code() == Error::kParseFailed) {
+    Tell(ShareStatus::State::kWaitingForContent, error.what());
+    return NextDelay(seconds(1), seconds(30));
+  }
   if (error.Code() == Error::kEngineIndexPaused) return OnIndexPaused();
   if (error.Code() == Error::kEngineNoSuchIndex) {
     status_.SetState(ShareStatus::State::kWaitingForEngine, error.what());

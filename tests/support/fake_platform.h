@@ -102,6 +102,8 @@ struct FakePlatform {
   /// What ParseFile does; when empty it fills KOVAMDPath, KOVAMDParent, KOVAMDFSName and KOVAMDIsDir false. May throw.
   std::function<void(const std::string& path, const Json::Value& config, Json::Value& document)> parse_file;
   std::vector<std::pair<std::string, Json::Value>> parsed;
+  /// What ExtractionProblem returns.
+  std::string extraction_problem;
 
   /// Connections, one used up by each Connect. When none is left, `engine` answers each message; when it is empty too,
   /// the connection is a real one to the Unix socket. What scripted connections were sent is kept in `sent`.

@@ -87,3 +87,5 @@ void KOVA::CONTENT_EXTRACT::ParseFile(const std::string& path, const Json::Value
   document["KOVAMDFSName"] = path.substr(slash + 1);
   document["KOVAMDIsDir"] = false;
 }
+
+std::string KOVA::CONTENT_EXTRACT::ExtractionProblem() { return FakePlatform::Get().extraction_problem; }

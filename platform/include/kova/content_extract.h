@@ -15,13 +15,24 @@ namespace KOVA::CONTENT_EXTRACT {
 ///
 /// Members beside the schema's: "_KOVAStamp" (string; changes when size, mtime, ctime or inode does) always; when the
 /// content was wanted, and of anything but a folder, "_KOVANeedMeta" (true), "_KOVAExtractError" (string; the reason)
-/// where it could not be read, else "_KOVATextEncoding" (string; " (guess)" at its end when the text was too short to
-/// tell) and, where there was more text than is kept, "_KOVATextCut" (true). A file without readable content still
-/// yields the document of its name; formats that no reader exists for have neither text nor error. The text is at most
-/// 1 MiB, from at most the first 2 MiB of the file. Blocks for the reading of one file. May be called by several
-/// threads at once.
-/// @throws std::runtime_error when `path` does not exist or cannot be examined at all.
+/// where it, or a part of it, could not be read, "_KOVATextEncoding" (string; " (guess)" at its end when the text was too
+/// short to tell), where there was more text than is kept "_KOVATextCut" (true), and where a reader was asked
+/// "_KOVAExtractVersion" (its version). A file without readable content still yields the document of its name; formats
+/// that no reader exists for have neither text nor error. The text is at most 1 MiB.
+///
+/// Content is read by a daemon, "kovacontentextractd", which is started when it does not run. Blocks for the reading of
+/// one file and of those before it. May be called by several threads at once.
+/// @throws std::runtime_error when `path` does not exist or cannot be examined at all, and when content was wanted and
+/// cannot be read at present, whatever the file: ExtractionProblem tells which it was.
 void ParseFile(const std::string& path, const Json::Value& config, Json::Value& document);
+
+/// Why content could not be read when this thread last called ParseFile: a sentence about the daemon, with its remedy.
+/// "" when that was not so.
+std::string ExtractionProblem();
+
+/// The version of what reads files of a content type now; 0 when nothing does. A document that has an error, or was made
+/// when there was no reader, and an older version than this is worth another try.
+int ExtractVersion(const std::string& content_type);
 
 /// The "_KOVAStamp" that ParseFile gives a file whose `lstat` is `status`: a short text without control characters.
 /// It changes when size, mtime (with nanoseconds), ctime or inode does, and does not depend on the path.

@@ -39,6 +39,8 @@ class Findings {
   /// Adds text in UTF-8; what is not is replaced. Text beyond the limit is dropped and noted as cut. False when no more
   /// is kept, so that a reader may stop.
   bool AddText(std::string_view text);
+  /// Notes that there is more text than was added.
+  void MarkCut() { cut_ = true; }
   /// Ends a line, paragraph, cell or page: the words before and behind do not touch.
   void Break();
 

@@ -1,13 +1,13 @@
-#include "platform/host/content/markup.h"
+#include "services/kovacontentextractd/readers/markup.h"
 
 #include <algorithm>
 #include <array>
 #include <cstring>
 
-#include "platform/host/content/entities.h"
-#include "platform/host/content/utf8.h"
+#include "services/kovacontentextractd/readers/entities.h"
+#include "services/kovacontentextractd/readers/utf8.h"
 
-namespace kova::content {
+namespace ferrox::extract {
 
 namespace {
 
@@ -360,4 +360,4 @@ std::string DeclaredXmlEncoding(std::string_view head) {
   return {};
 }
 
-}  // namespace kova::content
+}  // namespace ferrox::extract

@@ -4,7 +4,7 @@
 #include <string_view>
 
 /// From the bytes of a text file to UTF-8.
-namespace kova::content {
+namespace ferrox::extract {
 
 struct DecodedText {
   std::string text;      ///< valid UTF-8, without a byte order mark
@@ -17,4 +17,7 @@ struct DecodedText {
 /// @return false when the bytes are no text.
 bool Decode(std::string_view bytes, bool cut, const std::string& declared, DecodedText& decoded);
 
-}  // namespace kova::content
+/// Loads the converters of the encodings in use; after it they need no file any more.
+void LoadConverters();
+
+}  // namespace ferrox::extract

@@ -1,4 +1,4 @@
-#include "platform/host/content/encoding.h"
+#include "services/kovacontentextractd/readers/encoding.h"
 
 #include <iconv.h>
 #include <uchardet.h>
@@ -11,9 +11,9 @@
 #include <memory>
 #include <mutex>
 
-#include "platform/host/content/utf8.h"
+#include "services/kovacontentextractd/readers/utf8.h"
 
-namespace kova::content {
+namespace ferrox::extract {
 
 namespace {
 
@@ -300,6 +300,17 @@ bool Guess(std::string_view bytes, bool cut, DecodedText& decoded) {
 
 }  // namespace
 
+void LoadConverters() {
+  static constexpr const char* kInUse[] = {
+      "WINDOWS-1250", "WINDOWS-1251", "WINDOWS-1252", "WINDOWS-1253", "WINDOWS-1254", "WINDOWS-1255", "WINDOWS-1256",
+      "WINDOWS-1257", "WINDOWS-1258", "WINDOWS-874",  "ISO-8859-2",   "ISO-8859-3",   "ISO-8859-4",   "ISO-8859-5",
+      "ISO-8859-6",   "ISO-8859-7",   "ISO-8859-8",   "ISO-8859-10",  "ISO-8859-13",  "ISO-8859-15",  "ISO-8859-16",
+      "KOI8-U",       "IBM852",       "IBM855",       "IBM866",       "MAC-CYRILLIC", "GB18030",      "CP932",
+      "EUC-JP",       "ISO-2022-JP",  "UHC",          "ISO-2022-KR",  "JOHAB",        "BIG5-HKSCS",   "EUC-TW"};
+  // Never closed: a converter that nobody holds is unloaded.
+  for (const char* encoding : kInUse) (void)iconv_open("UTF-8", encoding);
+}
+
 bool Decode(std::string_view bytes, bool cut, const std::string& declared, DecodedText& decoded) {
   decoded = {};
   const int by_mark = ByMark(bytes, cut, decoded);
@@ -324,4 +335,4 @@ bool Decode(std::string_view bytes, bool cut, const std::string& declared, Decod
   return Guess(bytes, cut, decoded);
 }
 
-}  // namespace kova::content
+}  // namespace ferrox::extract

@@ -1,9 +1,9 @@
-#include "platform/host/content/entities.h"
+#include "services/kovacontentextractd/readers/entities.h"
 
 #include <algorithm>
 #include <iterator>
 
-namespace kova::content {
+namespace ferrox::extract {
 
 namespace {
 
@@ -194,4 +194,4 @@ uint32_t HtmlEntity(std::string_view name) {
   return found != std::end(kRows) && found->name == name ? found->code_point : 0;
 }
 
-}  // namespace kova::content
+}  // namespace ferrox::extract

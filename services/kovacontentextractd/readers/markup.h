@@ -6,7 +6,7 @@
 
 /// Text out of HTML and XML, in one pass over the bytes with constant memory beside the result. No document type is
 /// read, no entity is defined by the content, nothing is fetched; what is not well-formed is read as far as it goes.
-namespace kova::content {
+namespace ferrox::extract {
 
 struct MarkupText {
   std::string title;
@@ -23,4 +23,4 @@ MarkupText ReadXml(std::string_view source, size_t limit_bytes);
 std::string DeclaredHtmlEncoding(std::string_view head);
 std::string DeclaredXmlEncoding(std::string_view head);
 
-}  // namespace kova::content
+}  // namespace ferrox::extract

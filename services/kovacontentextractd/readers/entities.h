@@ -3,9 +3,9 @@
 #include <cstdint>
 #include <string_view>
 
-namespace kova::content {
+namespace ferrox::extract {
 
 /// The character of a named reference of HTML ("eacute"), 0 when the name is not known.
 uint32_t HtmlEntity(std::string_view name);
 
-}  // namespace kova::content
+}  // namespace ferrox::extract

@@ -1,0 +1,33 @@
+#pragma once
+
+#include <string_view>
+
+/// What kind of content a file has, by its name and its first bytes, and who reads it.
+namespace kova::content {
+
+/// The program that a reader is part of. Readers that need a library under the GPL have one of their own.
+enum class Program { kGeneral, kPdf, kPhoto };
+inline constexpr int kPrograms = 3;
+/// The name of a program, as it is installed.
+const char* ProgramName(Program program);
+
+struct Format {
+  std::string_view type;
+  const char* reader;  ///< what its program calls it
+  Program program;
+  /// Raised when the reader has learnt so much that files which it failed at are to be read again.
+  int version;
+};
+
+/// By an extension in lower case, without its dot; null for one that is not known.
+const char* TypeByExtension(std::string_view extension);
+/// How many of a file's first bytes tell its type.
+inline constexpr size_t kHeadBytes = 4096;
+/// By name and first bytes: what the name says, unless the bytes are those of something else. Null when neither tells.
+const char* TypeOf(std::string_view extension, std::string_view head);
+
+/// Who reads a type of content; null when nobody does. What is of no known type is read as kUnknown.
+const Format* FormatOf(std::string_view type);
+extern const Format kUnknown;
+
+}  // namespace kova::content

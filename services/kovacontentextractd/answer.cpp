@@ -1,0 +1,93 @@
+#include "services/kovacontentextractd/answer.h"
+
+#include <algorithm>
+#include <iterator>
+#include <map>
+
+#include "common/json_util.h"
+#include "fileindex/elastic/elastic_control.h"
+#include "fileindex/elastic/fields.h"
+#include "services/kovacontentextractd/readers/reader.h"
+#include "services/kovacontentextractd/readers/utf8.h"
+
+namespace ferrox::extract {
+
+namespace {
+
+namespace elastic = fileindex::elastic;
+
+constexpr size_t kJsonMaxBytes = 2U << 20;
+constexpr size_t kFieldMaxBytes = 64U << 10;
+constexpr Limits kLimits;
+
+/// What is known without the content, and so is not for it to say.
+constexpr const char* kFacts[] = {elastic::kKOVAMDPath,
+                                  elastic::kKOVAMDParent,
+                                  elastic::kKOVAMDFSName,
+                                  elastic::kKOVAMDSearchFileName,
+                                  elastic::kKOVAMDDisplayName,
+                                  elastic::kKOVAMDKind,
+                                  elastic::kKOVAMDExtension,
+                                  elastic::kKOVAMDIsDir,
+                                  elastic::kKOVAMDOwnerUserID,
+                                  elastic::kKOVAMDOwnerGroupID,
+                                  elastic::kKOVAMDPrivilege,
+                                  elastic::kKOVAMDFSSize,
+                                  elastic::kKOVAMDLogicalSize,
+                                  elastic::kKOVAMDPhysicalSize,
+                                  elastic::kKOVAMDDateAdded,
+                                  elastic::kKOVAMDFSContentChangeDate,
+                                  elastic::kKOVAMDFSCreationDate,
+                                  elastic::kKOVAMDAttributeChangeDate,
+                                  elastic::kKOVAMDContentModificationDate,
+                                  elastic::kKOVAMDWildcard,
+                                  elastic::kKOVAMDTextContent};
+
+enum class Type { kText, kInteger, kNumber, kBool };
+using Types = std::map<std::string, Type>;
+
+Type TypeNamed(const std::string& name) {
+  if (name == "int") return Type::kInteger;
+  if (name == "double") return Type::kNumber;
+  return name == "bool" ? Type::kBool : Type::kText;
+}
+
+/// The fields that a worker may set.
+Types MakeTypes() {
+  const Json::Value mappings = elastic::GetFileIndexMappings();
+  Types types = {{"_KOVATextCut", Type::kBool}, {"_KOVATextEncoding", Type::kText}, {"_KOVAExtractError", Type::kText}};
+  for (const char* name : elastic::kFieldNames)
+    types[name] = TypeNamed(mappings["properties"][name]["type"].asString());
+  for (const char* name : kFacts) types.erase(name);
+  return types;
+}
+
+/// `value` as the index takes it; null when it is not of that type.
+Json::Value OfType(Type type, const Json::Value& value) {
+  if (type == Type::kBool) return value.isBool() ? value : Json::Value();
+  if (type == Type::kInteger) return value.isInt64() ? Json::Value(value.asInt64()) : Json::Value();
+  if (type == Type::kNumber) return value.isNumeric() ? Json::Value(value.asDouble()) : Json::Value();
+  if (value.isNumeric()) return toString(value);
+  return value.isString() && value.asString().size() <= kFieldMaxBytes ? value : Json::Value();
+}
+
+}  // namespace
+
+bool ParseAnswer(std::string_view bytes, Answer& answer) {
+  static const Types types = MakeTypes();
+  const std::string_view json = bytes.substr(0, bytes.find('\0'));
+  const std::string_view text = bytes.substr(std::min(json.size() + 1, bytes.size()));
+  Json::Value fields;
+  if (json.size() > kJsonMaxBytes || ValidUtf8Prefix(json) != json.size()) return false;
+  if (!fromString(fields, std::string(json)) || !fields.isObject()) return false;
+  if (text.size() > kLimits.text_bytes || ValidUtf8Prefix(text) != text.size()) return false;
+  for (const auto& [name, type] : types) {
+    if (!fields.isMember(name)) continue;
+    Json::Value value = OfType(type, fields[name]);
+    if (!value.isNull()) answer.fields[name] = std::move(value);
+  }
+  answer.text = text;
+  return true;
+}
+
+}  // namespace ferrox::extract

@@ -1,0 +1,115 @@
+#include "services/kovacontentextractd/extractor.h"
+
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <array>
+#include <cerrno>
+
+#include <kova/content_type.h>
+
+#include "common/error.h"
+#include "common/file_util.h"
+#include "common/json_util.h"
+#include "common/log.h"
+#include "services/kovacontentextractd/open_beneath.h"
+#include "services/support/json_command.h"
+
+namespace ferrox::extract {
+
+namespace {
+
+using namespace kova::content;
+
+constexpr char kErrorField[] = "_KOVAExtractError";
+constexpr char kTypeField[] = "KOVAMDContentType";
+
+/// What the document says when the file could not be opened.
+std::string OpenProblem() {
+  if (errno == ELOOP || errno == EXDEV) return "reached through a link";
+  return ErrnoText();
+}
+
+Json::Value ErrorDocument(const std::string& reason) {
+  Json::Value document;
+  document[kErrorField] = reason;
+  return document;
+}
+
+}  // namespace
+
+Extractor::Extractor(const WorkerPool::Options& options) : pool_(options) { pool_.Probe(Program::kGeneral); }
+
+std::string Extractor::Handle(const std::string& request, const services::Peer& peer) {
+  std::string text;
+  std::string reply =
+      services::AnswerJsonCommand(request, peer, [&](const std::string& type, const Json::Value& data) -> Json::Value {
+        if (type == "status") {
+          Json::Value status = pool_.Status();
+          status["pid"] = getpid();
+          return status;
+        }
+        FERROX_FAIL_IF_AS(type != "extract", "type != \"extract\"", Error::kBadArgument, "unknown command " + type);
+        std::string root, path;
+        GetJsonValue(root, data, "root", true);
+        GetJsonValue(path, data, "path", true);
+        return Extract(root, path, text);
+      });
+  if (!text.empty()) reply.append(1, '\0').append(text);
+  return reply;
+}
+
+Json::Value Extractor::Extract(const std::string& root, const std::string& path, std::string& text) {
+  Json::Value found;
+  const UniqueFd file = OpenBeneath(root, path);
+  struct stat info = {};
+  if (!file.Valid() && (errno == ENOENT || errno == ENOTDIR)) {
+    found["gone"] = true;
+  } else if (!file.Valid() || fstat(file.Get(), &info) != 0) {
+    found["document"] = ErrorDocument(OpenProblem());
+  } else {
+    found["inode"] = Json::UInt64(info.st_ino);
+    found["document"] = S_ISREG(info.st_mode) ? Read(file.Get(), path, text) : ErrorDocument("not a regular file");
+  }
+  return found;
+}
+
+Json::Value Extractor::Read(int fd, const std::string& path, std::string& text) {
+  std::array<char, kHeadBytes> head;
+  const ssize_t got = pread(fd, head.data(), head.size(), 0);
+  if (got < 0) return ErrorDocument(ErrnoText());
+  const Task task = {fd, "", GetFileExtension(Basename(path), true), Basename(path)};
+  const char* type =
+      got == 0 ? TypeByExtension(task.extension) : TypeOf(task.extension, {head.data(), static_cast<size_t>(got)});
+  Json::Value document(Json::objectValue);
+  if (type != nullptr) document[kTypeField] = type;
+  const Format* format = type != nullptr ? FormatOf(type) : &kUnknown;
+  if (got == 0 || format == nullptr) return document;
+  Answer answer = ReadAs(*format, task, document);
+  // What only a look at the bytes of an unknown file tells.
+  const Format* second = format == &kUnknown ? FormatOf(answer.fields[kTypeField].asString()) : nullptr;
+  if (second != nullptr && answer.text.empty()) {
+    document[kTypeField] = answer.fields[kTypeField];
+    answer = ReadAs(*second, task, document);
+  }
+  for (const auto& name : answer.fields.getMemberNames()) {
+    if (!document.isMember(name)) document[name] = answer.fields[name];
+  }
+  text = std::move(answer.text);
+  return document;
+}
+
+Answer Extractor::ReadAs(const Format& format, const Task& task, Json::Value& document) {
+  Task complete = task;
+  complete.reader = format.reader;
+  if (pool_.Has(format.program)) {
+    document["_KOVAExtractVersion"] = format.version;
+    return pool_.Read(format.program, complete);
+  }
+  document["_KOVAExtractVersion"] = 0;  // so that it is read once the program is there
+  Answer answer;
+  answer.fields[kErrorField] = std::string("its reader, ") + ProgramName(format.program) + ", is not installed";
+  return answer;
+}
+
+}  // namespace ferrox::extract

@@ -1,0 +1,92 @@
+#include <malloc.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+
+#include "common/error.h"
+#include "common/file_util.h"
+#include "common/paths.h"
+#include "services/kovacontentextractd/extractor.h"
+#include "services/support/daemon.h"
+#include "services/support/frame_server.h"
+
+namespace {
+
+using namespace ferrox;
+
+constexpr char kHelp[] =
+    "usage: kovacontentextractd [--help | --version]\n"
+    "Reads text and metadata out of files, by workers that can do nothing else, in the foreground, until SIGTERM or\n"
+    "SIGINT. FERROX_ROOT chooses the instance, FERROX_LIBEXEC the folder of the workers.\n";
+
+/// For the questions about the daemon's state, which come while all workers are busy.
+constexpr unsigned kSpareThreads = 2;
+
+/// What a large text took is given back when it has been sent.
+void KeepLittleMemory() {
+  (void)mallopt(M_ARENA_MAX, 2);
+  (void)mallopt(M_MMAP_THRESHOLD, 128 << 10);
+  (void)mallopt(M_TRIM_THRESHOLD, 1 << 20);
+}
+
+/// In the folder FERROX_LIBEXEC, beside this program, or in "../libexec" from there; "" when it is in none.
+std::string FindWorker(const std::string& name) {
+  char self[4096] = {};
+  const ssize_t length = readlink("/proc/self/exe", self, sizeof(self) - 1);
+  const std::string own = length > 0 ? Dirname(std::string(self, static_cast<size_t>(length))) : "";
+  const char* given = secure_getenv("FERROX_LIBEXEC");
+  for (const std::string& folder : {std::string(given != nullptr ? given : ""), own, Dirname(own) + "/libexec"}) {
+    struct stat info = {};
+    const std::string path = folder + "/" + name;
+    if (!folder.empty() && stat(path.c_str(), &info) == 0 && S_ISREG(info.st_mode)) return path;
+  }
+  return {};
+}
+
+extract::WorkerPool::Options PoolOptions() {
+  extract::WorkerPool::Options options;
+  for (int i = 0; i < kova::content::kPrograms; ++i) {
+    options.programs[static_cast<size_t>(i)] =
+        FindWorker(kova::content::ProgramName(static_cast<kova::content::Program>(i)));
+  }
+  if (options.programs[0].empty()) {
+    throw Error(Error::kInternal, std::string(kova::content::ProgramName(kova::content::Program::kGeneral)) +
+                                      " is not installed beside this program; set FERROX_LIBEXEC to its folder");
+  }
+  options.empty_folder = InstancePath("/var/run/kovacontentextractd.empty");
+  (void)services::MakeFolders(options.empty_folder, 0555);
+  return options;
+}
+
+void Serve() {
+  services::Daemon daemon("kovacontentextractd");
+  const extract::WorkerPool::Options pool_options = PoolOptions();
+  extract::Extractor extractor(pool_options);
+  services::FrameServerOptions options;
+  options.socket_path = InstancePath(kContentExtractdSocket);
+  options.workers = pool_options.workers_max + kSpareThreads;
+  services::FrameServer server(options, [&extractor](const std::string& request, const services::Peer& peer) {
+    return extractor.Handle(request, peer);
+  });
+  daemon.NotifyReady();
+  server.Run(daemon.StopFd());
+}
+
+}  // namespace
+
+int main(int argc, char** argv) {
+  if (argc == 2 && strcmp(argv[1], "--help") == 0) return fputs(kHelp, stdout) < 0 ? 3 : 0;
+  if (argc == 2 && strcmp(argv[1], "--version") == 0) return printf("kovacontentextractd %s\n", FERROX_VERSION) < 0;
+  if (argc != 1) return fputs(kHelp, stderr) < 0 ? 3 : 2;
+  try {
+    KeepLittleMemory();
+    Serve();
+    return 0;
+  } catch (const std::exception& error) {
+    (void)fprintf(stderr, "kovacontentextractd: %s\n", error.what());
+    return 3;
+  }
+}

@@ -1,0 +1,71 @@
+#include "services/kovacontentextractd/open_beneath.h"
+
+#include <fcntl.h>
+#include <linux/openat2.h>
+#include <sys/stat.h>
+#include <sys/syscall.h>
+#include <unistd.h>
+
+#include <cerrno>
+
+namespace ferrox::extract {
+
+namespace {
+
+constexpr int kFileFlags = O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC | O_NOCTTY;
+constexpr int kFolderFlags = O_PATH | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC;
+
+int AskKernel(int root, const char* below, int flags) {
+  open_how how = {};
+  how.flags = static_cast<uint64_t>(flags);
+  how.resolve = RESOLVE_BENEATH | RESOLVE_NO_SYMLINKS | RESOLVE_NO_MAGICLINKS;
+  return static_cast<int>(syscall(SYS_openat2, root, below, &how, sizeof(how)));
+}
+
+/// A link in the place of a folder is ENOTDIR to the kernel here; it is told as what it is.
+UniqueFd StepInto(int folder, const char* name) {
+  UniqueFd next(openat(folder, name, kFolderFlags));
+  struct stat info = {};
+  if (!next.Valid() && errno == ENOTDIR) {
+    const bool is_link = fstatat(folder, name, &info, AT_SYMLINK_NOFOLLOW) == 0 && S_ISLNK(info.st_mode);
+    errno = is_link ? ELOOP : ENOTDIR;
+  }
+  return next;
+}
+
+int Walk(int root, const std::string& below, int flags) {
+  UniqueFd folder(openat(root, ".", kFolderFlags));
+  size_t begin = 0;
+  for (size_t slash; folder.Valid() && (slash = below.find('/', begin)) != std::string::npos; begin = slash + 1) {
+    const std::string name = below.substr(begin, slash - begin);
+    if (name == "..") return errno = EXDEV, -1;
+    if (!name.empty()) folder = StepInto(folder.Get(), name.c_str());
+  }
+  const std::string last = below.substr(begin);
+  if (last == "..") return errno = EXDEV, -1;
+  return folder.Valid() ? openat(folder.Get(), last.c_str(), flags) : -1;
+}
+
+int Open(int root, const std::string& below, int flags, bool may_ask_kernel) {
+  if (may_ask_kernel) {
+    const int fd = AskKernel(root, below.c_str(), flags);
+    if (fd >= 0 || (errno != ENOSYS && errno != E2BIG && errno != EINVAL)) return fd;
+  }
+  return Walk(root, below, flags);
+}
+
+}  // namespace
+
+UniqueFd OpenBeneath(const std::string& root, const std::string& path, bool may_ask_kernel) {
+  const bool is_below = path.size() > root.size() + 1 && path.compare(0, root.size(), root) == 0 &&
+                        path[root.size()] == '/' && path.find('\0') == std::string::npos;
+  if (!is_below) return errno = EINVAL, UniqueFd();
+  const UniqueFd folder(open(root.empty() ? "/" : root.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
+  if (!folder.Valid()) return UniqueFd();
+  const std::string below = path.substr(root.size() + 1);
+  int fd = Open(folder.Get(), below, kFileFlags | O_NOATIME, may_ask_kernel);
+  if (fd < 0 && errno == EPERM) fd = Open(folder.Get(), below, kFileFlags, may_ask_kernel);
+  return UniqueFd(fd);
+}
+
+}  // namespace ferrox::extract

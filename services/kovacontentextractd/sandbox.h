@@ -1,0 +1,19 @@
+#pragma once
+
+#include <string>
+#include <vector>
+
+namespace ferrox::extract {
+
+/// Takes from this process, for good, all but computing and reading what is open: files by name, sockets, processes,
+/// executable memory, other users' rights. What the kernel does not have is left out.
+/// @param empty_folder becomes the root of the file system where that is allowed
+/// @return what is missing, one name each; empty when the sandbox is complete
+std::vector<std::string> CloseSandbox(const char* empty_folder);
+
+/// The CPU time that one file may take.
+inline constexpr int kCpuSecondsPerFile = 20;
+/// Starts to count it anew; 0 stops counting. The process is killed by SIGPROF when it is used up.
+void LimitCpuTime(int limit_seconds);
+
+}  // namespace ferrox::extract

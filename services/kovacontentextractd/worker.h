@@ -1,0 +1,24 @@
+#pragma once
+
+#include "services/kovacontentextractd/readers/reader.h"
+
+/// The main part of every worker program.
+namespace ferrox::extract {
+
+struct ReaderRow {
+  const char* name;
+  Reader reader;
+};
+
+struct Worker {
+  const ReaderRow* readers;
+  size_t reader_count;
+  /// Loads what the readers need from the disk; called once, before the sandbox closes.
+  void (*prepare)();
+};
+
+/// Closes the sandbox, says what of it could not be had, and reads files for the daemon until that hangs up.
+/// `empty_folder` becomes the root of the file system where that is allowed. @return the exit status.
+int RunWorker(const Worker& worker, const char* empty_folder);
+
+}  // namespace ferrox::extract

@@ -1,0 +1,80 @@
+#pragma once
+
+#include <array>
+#include <chrono>
+#include <condition_variable>
+#include <memory>
+#include <mutex>
+#include <string>
+#include <thread>
+#include <vector>
+
+#include <json/value.h>
+
+#include <kova/content_type.h>
+
+#include "services/kovacontentextractd/answer.h"
+#include "services/kovacontentextractd/worker_process.h"
+
+namespace ferrox::extract {
+
+/// Workers, as many as there are processors, of the programs that are asked for. They are started when they are needed,
+/// ended when they have read many files or have had nothing to do for a while, and replaced when a file has killed
+/// them.
+class WorkerPool {
+ public:
+  struct Options {
+    /// The path of each program; "" where it is not installed.
+    std::array<std::string, kova::content::kPrograms> programs;
+    std::string empty_folder;  ///< what workers see of the file system, where that can be arranged
+    unsigned workers_max = std::max(std::thread::hardware_concurrency(), 1U);
+    unsigned files_per_worker = 200;
+    std::chrono::milliseconds longest_read = std::chrono::seconds(30);
+    std::chrono::milliseconds idle_time = std::chrono::seconds(30);
+  };
+
+  explicit WorkerPool(const Options& options);
+  WorkerPool(const WorkerPool&) = delete;
+  WorkerPool& operator=(const WorkerPool&) = delete;
+  ~WorkerPool();
+
+  /// Starts a worker, which tells what of the sandbox this kernel lacks. @throws Error kInternal when that fails.
+  void Probe(kova::content::Program program);
+  bool Has(kova::content::Program program) const { return !options_.programs[static_cast<size_t>(program)].empty(); }
+
+  /// Has a file read; waits for a free worker, then at most for the longest read. From any thread. A file that kills
+  /// its worker, keeps it too long or makes it lie has only "_KOVAExtractError".
+  /// @throws Error kInternal when no worker can be started.
+  Answer Read(kova::content::Program program, const Task& task);
+
+  /// "workers" and "workers_max", "missing" (what the sandbox lacks), "files" and "blamed" since the daemon's start.
+  Json::Value Status() const;
+
+ private:
+  using SteadyClock = std::chrono::steady_clock;
+  struct Idle {
+    std::unique_ptr<WorkerProcess> worker;
+    kova::content::Program program;
+    SteadyClock::time_point since;
+  };
+
+  class Lease;
+  std::unique_ptr<WorkerProcess> TakeIdle(kova::content::Program program);
+  std::unique_ptr<WorkerProcess> Take(kova::content::Program program);
+  void Give(std::unique_ptr<WorkerProcess> worker, kova::content::Program program);
+  std::unique_ptr<WorkerProcess> Start(kova::content::Program program);
+  void EndIdle();
+
+  const Options options_;
+  mutable std::mutex mutex_;
+  std::condition_variable changed_;
+  std::vector<Idle> idle_;  ///< the longest idle first
+  unsigned busy_ = 0;
+  uint64_t files_ = 0;
+  uint64_t blamed_ = 0;
+  Json::Value missing_ = Json::Value(Json::arrayValue);
+  bool stopping_ = false;
+  std::thread ender_;
+};
+
+}  // namespace ferrox::extract
