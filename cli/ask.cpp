@@ -25,6 +25,7 @@ struct Daemon {
 constexpr Daemon kEngine = {"the search engine", kElasticdSocket, Error::kEngineUnreachable};
 constexpr Daemon kIndexDaemon = {"the index daemon", kFileIndexdSocket, Error::kInternal};
 constexpr Daemon kNotificationDaemon = {"the notification daemon", kNotifydSocket, Error::kInternal};
+constexpr Daemon kContentExtraction = {"content extraction", kContentExtractdSocket, Error::kInternal};
 
 Json::Value DataOf(const Daemon& daemon, const std::string& text) {
   Json::Value reply;
@@ -106,6 +107,10 @@ Json::Value AskIndexDaemonIfRunning(const std::string& type, const Json::Value& 
 
 Json::Value AskNotificationDaemonIfRunning(const std::string& type, const Json::Value& data) {
   return CommandIfRunning(kNotificationDaemon, type, data);
+}
+
+Json::Value AskContentExtractionIfRunning(const std::string& type, const Json::Value& data) {
+  return CommandIfRunning(kContentExtraction, type, data);
 }
 
 /// First what the file systems have reported is in the queues, then what is in the queues is in the index.

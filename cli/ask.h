@@ -15,6 +15,7 @@ Json::Value AskIndexDaemon(const std::string& type, const Json::Value& data);
 /// The same, but null when the daemon does not run.
 Json::Value AskIndexDaemonIfRunning(const std::string& type, const Json::Value& data);
 Json::Value AskNotificationDaemonIfRunning(const std::string& type, const Json::Value& data);
+Json::Value AskContentExtractionIfRunning(const std::string& type, const Json::Value& data);
 
 /// Waits until what was changed before, in a share or ("") in all, is in the index.
 /// @throws Failure, with reason and remedy, when that is not so within the time.

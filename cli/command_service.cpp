@@ -26,9 +26,11 @@ struct Service {
   int option;
 };
 
-/// In the order in which they start; the index daemon needs the engine, and is told of changes.
+/// In the order in which they start; the index daemon needs the engine and those who read files, and is told of
+/// changes.
 constexpr Service kServices[] = {
     {"kovaelasticd", "search engine", &KLIBServiceStart, &KLIBServiceStop, 1},
+    {"kovacontentextractd", "content extraction", &KLIBServiceStart, &KLIBServiceStop, 1},
     {"kovanotifyd", "notification daemon", &KLIBServiceStart, &KLIBServiceStop, 1},
     {"pkg-Ferrox-fileindexd", "index daemon", &KLIBServicectlStart, &KLIBServicectlStop, KLIB_SERVICECTL_UPSTART},
 };

@@ -105,10 +105,10 @@ Json::Value EngineState() {
   }
 }
 
-/// The notification daemon's "status" reply, or null when it does not run.
-Json::Value NotificationDaemonState() {
+/// A daemon's "status" reply, or null when it does not run.
+Json::Value StateOf(Json::Value (*ask)(const std::string& type, const Json::Value& data)) {
   try {
-    return AskNotificationDaemonIfRunning("status", Json::Value());
+    return ask("status", Json::Value());
   } catch (const Failure&) {
     return Json::Value();  // it does not answer; what the others say is worth showing
   }
@@ -126,12 +126,28 @@ std::string DaemonText(const Json::Value& daemon, bool needed) {
          " workers" + PauseText(daemon);
 }
 
+/// What of the workers' sandbox the kernel lacks is worth knowing.
+std::string ContentExtractionText(const Json::Value& daemon) {
+  if (!daemon.isObject()) return "does not run; it starts with the first file whose content is wanted";
+  std::string text = "runs, process " + std::to_string(IntOf(daemon, "pid")) + ", " + Count(UintOf(daemon, "workers")) +
+                     " of at most " + Count(UintOf(daemon, "workers_max")) + " workers, " +
+                     Count(UintOf(daemon, "files")) + " files read";
+  const uint64_t blamed = UintOf(daemon, "blamed");
+  if (blamed != 0) text += ", of which " + Count(blamed) + " broke a worker";
+  for (const Json::Value& piece : daemon["missing"]) {
+    if (piece.isString())
+      text += "\n    the workers lack a protection on this system: " + EscapeForTerminal(piece.asString());
+  }
+  return text;
+}
+
 }  // namespace
 
 int RunStatus(const Arguments& arguments) {
   const Json::Value engine = EngineState();
   Json::Value daemon = AskIndexDaemonIfRunning("status", Json::Value());
-  const Json::Value notification_daemon = NotificationDaemonState();
+  const Json::Value notification_daemon = StateOf(&AskNotificationDaemonIfRunning);
+  const Json::Value content_extraction = StateOf(&AskContentExtractionIfRunning);
   AddWatches(notification_daemon, daemon);
   std::string problem;
   const Json::Value resting = RestingShares(daemon, problem);
@@ -140,6 +156,7 @@ int RunStatus(const Arguments& arguments) {
     json["engine"] = engine;
     json["index_daemon"] = daemon;
     json["notification_daemon"] = notification_daemon;
+    json["content_extraction"] = content_extraction;
     json["resting_shares"] = resting;
     if (!problem.empty()) json["problem"] = problem;
     (void)printf("%s\n", ToScriptJson(json).c_str());
@@ -150,6 +167,7 @@ int RunStatus(const Arguments& arguments) {
   (void)printf("index daemon: %s\n", DaemonText(daemon, needed).c_str());
   const bool has_shares = !daemon.isNull() && !daemon["shares"].empty();
   (void)printf("notification daemon: %s\n", NotificationDaemonText(notification_daemon, needed || has_shares).c_str());
+  (void)printf("content extraction: %s\n", ContentExtractionText(content_extraction).c_str());
   if (!problem.empty()) (void)printf("indexed folders: %s\n", EscapeForTerminal(problem).c_str());
   if (!daemon.isNull()) {
     for (const Json::Value& share : daemon["shares"]) PrintShare(share, !notification_daemon.isNull());

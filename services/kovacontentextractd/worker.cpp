@@ -50,7 +50,7 @@ std::string ToText(const Json::Value& value) {
 }
 
 /// The JSON text and, behind a zero byte, the file's text as it is: quoting a megabyte costs more than reading it did.
-bool Answer(Json::Value document) {
+bool Answer(uint32_t number, Json::Value document) {
   Json::Value text;
   const bool has_text = document.removeMember("KOVAMDTextContent", &text);
   const std::string json = ToText(document);
@@ -58,12 +58,13 @@ bool Answer(Json::Value document) {
   const char* end = nullptr;
   if (has_text) (void)text.getString(&begin, &end);
   const auto text_bytes = static_cast<size_t>(end - begin);
-  const auto length = static_cast<uint32_t>(json.size() + (has_text ? 1 + text_bytes : 0));
-  return WriteAll(&length, sizeof(length)) && WriteAll(json.data(), json.size()) &&
+  const AnswerHeader header = {static_cast<uint32_t>(json.size() + (has_text ? 1 + text_bytes : 0)), number};
+  return WriteAll(&header, sizeof(header)) && WriteAll(json.data(), json.size()) &&
          (!has_text || (WriteAll("", 1) && WriteAll(begin, text_bytes)));
 }
 
 struct Request {
+  uint32_t number = 0;
   std::string reader;
   Source source;
 };
@@ -90,6 +91,7 @@ bool ReceiveHeader(RequestHeader& header, int& fd) {
 bool ReceiveRequest(Request& request) {
   RequestHeader header;
   if (!ReceiveHeader(header, request.source.fd)) return false;
+  request.number = header.number;
   request.reader.resize(header.reader_bytes);
   request.source.extension.resize(header.extension_bytes);
   request.source.name.resize(header.name_bytes);
@@ -119,14 +121,14 @@ int RunWorker(const Worker& worker, const char* empty_folder) try {
   Json::Value greeting(Json::objectValue);
   greeting["missing"] = Json::Value(Json::arrayValue);
   for (const std::string& piece : CloseSandbox(empty_folder)) greeting["missing"].append(piece);
-  bool connected = Answer(greeting);
+  bool connected = Answer(0, greeting);
   for (Request request; connected && ReceiveRequest(request);) {
     Findings findings;
     LimitCpuTime(kCpuSecondsPerFile);
     Read(worker, request, findings);
     LimitCpuTime(0);
     (void)close(request.source.fd);
-    connected = Answer(findings.ToDocument());
+    connected = Answer(request.number, findings.ToDocument());
   }
   return 0;
 } catch (const std::bad_alloc&) {

@@ -107,7 +107,6 @@ bool WorkerProcess::IsReady() const {
 
 WorkerProcess::Outcome WorkerProcess::Ask(const Task& task, milliseconds longest, std::string& answer) {
   if (!Send(task)) return Outcome::kNotAsked;
-  ++files_read_;
   const Outcome outcome = Receive(SteadyClock::now() + longest, answer);
   if (outcome == Outcome::kCrashed) return HowItEnded();
   if (outcome != Outcome::kAnswered) End();
@@ -117,7 +116,7 @@ WorkerProcess::Outcome WorkerProcess::Ask(const Task& task, milliseconds longest
 /// Fits into the socket's buffer, so that a worker that takes nothing cannot hold us.
 bool WorkerProcess::Send(const Task& task) {
   RequestHeader header = {static_cast<uint16_t>(task.reader.size()), static_cast<uint16_t>(task.extension.size()),
-                          static_cast<uint16_t>(task.name.size()), 0};
+                          static_cast<uint16_t>(task.name.size()), 0, ++requests_};
   std::string bytes(reinterpret_cast<const char*>(&header), sizeof(header));
   bytes += task.reader + task.extension + task.name;
   alignas(cmsghdr) char control[CMSG_SPACE(sizeof(int))] = {};
@@ -140,14 +139,15 @@ bool WorkerProcess::Send(const Task& task) {
 }
 
 WorkerProcess::Outcome WorkerProcess::Receive(TimePoint end, std::string& answer) {
-  uint32_t length = 0;
-  std::string header;
-  const Outcome outcome = ReadExactly(sizeof(length), end, header);
+  AnswerHeader header;
+  std::string bytes;
+  const Outcome outcome = ReadExactly(sizeof(header), end, bytes);
   if (outcome != Outcome::kAnswered) return outcome;
-  memcpy(&length, header.data(), sizeof(length));
-  if (length > kAnswerMaxBytes) return Outcome::kNonsense;
+  memcpy(&header, bytes.data(), sizeof(header));
+  if (header.number != requests_) return Outcome::kNotAsked;  // an earlier file still speaks
+  if (header.bytes > kAnswerMaxBytes) return Outcome::kNonsense;
   answer.clear();
-  return ReadExactly(length, end, answer);
+  return ReadExactly(header.bytes, end, answer);
 }
 
 /// Memory grows with what arrives, not with what is announced.

@@ -34,11 +34,11 @@ class WorkerProcess {
   const Json::Value& Missing() const { return missing_; }
   /// Whether it lives and waits for a file.
   bool IsReady() const;
-  unsigned FilesRead() const { return files_read_; }
+  unsigned FilesRead() const { return requests_; }
 
   enum class Outcome {
     kAnswered,
-    kNotAsked,  ///< it had ended before it saw the file
+    kNotAsked,  ///< it had ended before it saw the file, or still talked of another one
     kTookTooLong,
     kNoMemory,
     kCrashed,
@@ -61,7 +61,7 @@ class WorkerProcess {
   pid_t pid_ = -1;
   UniqueFd socket_;
   Json::Value missing_ = Json::Value(Json::arrayValue);
-  unsigned files_read_ = 0;
+  uint32_t requests_ = 0;
 };
 
 }  // namespace ferrox::extract

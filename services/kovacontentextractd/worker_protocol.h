@@ -15,6 +15,13 @@ struct RequestHeader {
   uint16_t extension_bytes;
   uint16_t name_bytes;
   uint16_t unused;
+  uint32_t number;  ///< the first request of a worker is 1
+};
+
+/// An answer: this, then the JSON text and, behind a zero byte, the file's text. The greeting answers request 0.
+struct AnswerHeader {
+  uint32_t bytes;
+  uint32_t number;  ///< of the request, so that no answer is taken for another file's
 };
 
 /// The exit status of a worker that could get no more memory.

@@ -14,7 +14,7 @@ import unittest
 
 BIN = os.environ.get("FERROX_BIN", "")
 TIMEOUT = 120
-DAEMONS = ("kovaelasticd", "kovanotifyd", "fileindexd")
+DAEMONS = ("kovaelasticd", "kovacontentextractd", "kovanotifyd", "fileindexd")
 
 CREATE, MODIFY, DELETE, RENAME = 0x40, 0x2, 0x80, 0x100
 

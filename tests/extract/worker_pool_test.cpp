@@ -1,0 +1,135 @@
+#include "services/kovacontentextractd/worker_pool.h"
+
+#include <fcntl.h>
+#include <unistd.h>
+
+#include <atomic>
+#include <fstream>
+#include <string>
+#include <thread>
+#include <vector>
+
+#include <gtest/gtest.h>
+
+#include "common/error.h"
+#include "common/unique_fd.h"
+#include "tests/support/temp_dir.h"
+
+namespace ferrox::test {
+namespace {
+
+using extract::Answer;
+using extract::WorkerPool;
+using kova::content::Program;
+using namespace std::chrono_literals;
+
+WorkerPool::Options TestOptions(unsigned workers = 1) {
+  WorkerPool::Options options;
+  options.programs = {FERROX_TEST_WORKER, "", "/no/such/program"};
+  options.empty_folder = TestRoot() + "/tmp";
+  options.workers_max = workers;
+  return options;
+}
+
+class WorkerPoolTest : public testing::Test {
+ protected:
+  Answer Read(WorkerPool& pool, const std::string& reader, const std::string& content = "content") {
+    WriteFile(dir_ / "file", content);
+    const UniqueFd file(open((dir_ / "file").c_str(), O_RDONLY | O_CLOEXEC));
+    return pool.Read(Program::kGeneral, {file.Get(), reader, "txt", "file.txt"});
+  }
+
+  TempDir dir_;
+};
+
+int64_t ResidentKiB() {
+  std::ifstream status("/proc/self/status");
+  for (std::string word; status >> word;) {
+    int64_t kib = 0;
+    if (word == "VmRSS:" && status >> kib) return kib;
+  }
+  return -1;
+}
+
+TEST_F(WorkerPoolTest, TheSandboxHolds) {
+  WorkerPool pool(TestOptions());
+  const Answer answer = Read(pool, "escape");
+  EXPECT_EQ("tried", answer.text);
+  EXPECT_EQ("", answer.fields["KOVAMDComment"].asString()) << "these worked";
+  EXPECT_EQ(Json::arrayValue, pool.Status()["missing"].type());
+}
+
+TEST_F(WorkerPoolTest, EachBadFileIsBlamedOnceAndTheNextIsRead) {
+  WorkerPool::Options options = TestOptions();
+  options.longest_read = 1500ms;
+  WorkerPool pool(options);
+  const struct {
+    const char* reader;
+    const char* content;
+    const char* reason;
+  } rows[] = {
+      {"crash", "", "crashed the reader"},     {"be killed", "", "needs too much memory"},
+      {"hang", "", "took too long"},           {"spin", "", "took too long"},
+      {"devour", "", "needs too much memory"}, {"announce", "", "confused the reader"},
+      {"babble", "", "confused the reader"},   {"bytes", "not JSON", "confused the reader"},
+      {"bytes", "[1]", "confused the reader"}, {"bytes", "{\"KOVAMDTitle\":\"x", "confused the reader"},
+  };
+  uint64_t read = 0;
+  for (const auto& row : rows) {
+    EXPECT_EQ(row.reason, Read(pool, row.reader, row.content).fields["_KOVAExtractError"].asString()) << row.reader;
+    const Answer next = Read(pool, "count");
+    EXPECT_FALSE(next.fields.isMember("_KOVAExtractError")) << "after " << row.reader;
+    EXPECT_FALSE(next.text.empty()) << "after " << row.reader;
+    read += 2;
+  }
+  EXPECT_EQ(read, pool.Status()["files"].asUInt64());
+}
+
+TEST_F(WorkerPoolTest, AnAnswerIsNeverTakenForAnotherFiles) {
+  WorkerPool pool(TestOptions());
+  EXPECT_EQ("of another file", Read(pool, "twice").fields["KOVAMDTitle"].asString()) << "the file's own lie";
+  EXPECT_EQ("1", Read(pool, "count").text) << "not what the old worker had left to say";
+}
+
+TEST_F(WorkerPoolTest, WorkersAreReplacedInTime) {
+  WorkerPool::Options options = TestOptions();
+  options.files_per_worker = 3;
+  options.idle_time = 20ms;
+  WorkerPool pool(options);
+  std::string counts;
+  for (int i = 0; i < 7; ++i) counts += Read(pool, "count").text;
+  EXPECT_EQ("1231231", counts);
+  for (int i = 0; i < 500 && pool.Status()["workers"].asUInt() != 0; ++i) std::this_thread::sleep_for(10ms);
+  EXPECT_EQ(0U, pool.Status()["workers"].asUInt()) << "an idle pool is empty";
+  EXPECT_THROW(pool.Probe(Program::kPhoto), Error) << "a program that cannot be run";
+  EXPECT_EQ("1", Read(pool, "count").text);
+}
+
+TEST_F(WorkerPoolTest, AThousandBadFilesLeaveNothingBehind) {
+  WorkerPool pool(TestOptions(4));
+  const std::string content = "{}" + std::string(1, '\0') + std::string(900000, 'x');
+  const auto round = [&](int files) {
+    std::atomic<int> left = files, blamed = 0;
+    std::vector<std::thread> threads;
+    for (int t = 0; t < 4; ++t) {
+      threads.emplace_back([&] {
+        const UniqueFd file(open((dir_ / "file").c_str(), O_RDONLY | O_CLOEXEC));
+        constexpr const char* kReaders[] = {"crash", "bytes", "announce", "babble", "be killed"};
+        for (int i; (i = --left) >= 0;) {
+          const Answer answer = pool.Read(Program::kGeneral, {file.Get(), kReaders[i % 5], "", "x"});
+          blamed += answer.fields.isMember("_KOVAExtractError") ? 1 : 0;
+        }
+      });
+    }
+    for (std::thread& thread : threads) thread.join();
+    return blamed.load();
+  };
+  WriteFile(dir_ / "file", content);
+  (void)round(100);
+  const int64_t before = ResidentKiB();
+  EXPECT_EQ(800, round(1000));
+  EXPECT_LT(ResidentKiB() - before, 10 * 1024);
+}
+
+}  // namespace
+}  // namespace ferrox::test
