@@ -101,11 +101,9 @@ TEST_F(HostServiceTest, SeveralStartersStartOne) {
 }
 
 TEST_F(HostServiceTest, WhatCannotBeStartedSaysSo) {
-  EXPECT_LT(KLIBServiceStart("kovacontentextractd", 1), 0) << "there is no such program";
-  EXPECT_EQ(KOVA_ERR_NOT_SUPPORTED, KLIBCErrGet());
-  EXPECT_NE(string::npos, kova::host::LastServiceProblem().find("kovacontentextractd is not installed"));
-  EXPECT_EQ(0, KLIBServiceIsRunning("kovacontentextractd"));
   EXPECT_LT(KLIBServiceStart("no-such-service", 1), 0);
+  EXPECT_EQ(KOVA_ERR_NOT_SUPPORTED, KLIBCErrGet());
+  EXPECT_NE(string::npos, kova::host::LastServiceProblem().find("no-such-service"));
   EXPECT_LT(KLIBServiceIsRunning("no-such-service"), 0);
   EXPECT_LT(KLIBServiceRestart("samba"), 0) << "an instance does not switch the host's own";
   EXPECT_EQ(KOVA_ERR_NOT_SUPPORTED, KLIBCErrGet());

@@ -256,7 +256,8 @@ class LiveTest(unittest.TestCase):
         with tempfile.TemporaryDirectory() as folder:  # the programs, where such a user can reach them
             os.chmod(folder, 0o755)
             programs = os.environ["FERROX_BIN"]
-            for program in ("fileindexctl", "kovaelasticd", "kovanotifyd", "fileindexd"):
+            for program in ("fileindexctl", "kovaelasticd", "kovanotifyd", "fileindexd", "kovacontentextractd",
+                            "kovacontentworker"):
                 shutil.copy(f"{programs}/{program}", folder)
             shutil.copytree(f"{programs}/../lib", f"{folder}/lib", ignore=shutil.ignore_patterns("*.a"))
             for script in ("instance.py", "live.py", "live_test.py"):
