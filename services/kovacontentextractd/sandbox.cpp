@@ -4,7 +4,6 @@
 #include <grp.h>
 #include <linux/landlock.h>
 #include <seccomp.h>
-#include <signal.h>
 #include <sys/mman.h>
 #include <sys/prctl.h>
 #include <sys/resource.h>
@@ -22,6 +21,7 @@ namespace {
 
 constexpr uid_t kNobody = 65534;
 constexpr int kNiceness = 10;
+constexpr rlim_t kCpuSecondsPerProcess = 3600;
 constexpr rlim_t kFilesMax = 16;  // the three usual ones, the daemon's socket, the file, and copies of it
 
 #if defined(__SANITIZE_ADDRESS__) || defined(__SANITIZE_THREAD__)
@@ -46,7 +46,9 @@ bool LimitResources() {
   // The shadow of a sanitizer takes terabytes of addresses.
   const bool memory = kSanitized || Limit(RLIMIT_AS, kAddressSpace);
   const bool files = Limit(RLIMIT_NOFILE, kFilesMax) && Limit(RLIMIT_FSIZE, 0) && Limit(RLIMIT_CORE, 0);
-  return memory && files && Limit(RLIMIT_NPROC, 0);
+  // Each file has a limit of its own; this one is for what has taken the process over and outlives the daemon.
+  const bool time = Limit(RLIMIT_CPU, kCpuSecondsPerProcess);
+  return memory && files && time && Limit(RLIMIT_NPROC, 0);
 }
 
 /// Whoever may change users becomes nobody, below an empty root. Everybody else has nothing to give up.
@@ -157,7 +159,6 @@ std::vector<std::string> CloseSandbox(const char* empty_folder) {
   };
   note(YieldToOthers(), "idle priority");
   note(BecomeNobody(empty_folder), "a user without rights");
-  (void)prctl(PR_SET_PDEATHSIG, SIGKILL);
   (void)prctl(PR_SET_DUMPABLE, 0);
   note(LimitResources(), "resource limits");
   note(prctl(PR_SET_NO_NEW_PRIVS, 1, 0, 0, 0) == 0, "no new privileges");

@@ -60,19 +60,21 @@ TEST_F(WorkerPoolTest, TheSandboxHolds) {
 }
 
 TEST_F(WorkerPoolTest, EachBadFileIsBlamedOnceAndTheNextIsRead) {
-  WorkerPool::Options options = TestOptions();
-  options.longest_read = 1500ms;
-  WorkerPool pool(options);
+  WorkerPool pool(TestOptions());
   const struct {
     const char* reader;
     const char* content;
     const char* reason;
   } rows[] = {
-      {"crash", "", "crashed the reader"},     {"be killed", "", "needs too much memory"},
-      {"hang", "", "took too long"},           {"spin", "", "took too long"},
-      {"devour", "", "needs too much memory"}, {"announce", "", "confused the reader"},
-      {"babble", "", "confused the reader"},   {"bytes", "not JSON", "confused the reader"},
-      {"bytes", "[1]", "confused the reader"}, {"bytes", "{\"KOVAMDTitle\":\"x", "confused the reader"},
+      {"crash", "", "crashed the reader"},
+      {"be killed", "", "needs too much memory"},
+      {"spin", "", "took too long"},
+      {"devour", "", "needs too much memory"},
+      {"announce", "", "confused the reader"},
+      {"babble", "", "confused the reader"},
+      {"bytes", "not JSON", "confused the reader"},
+      {"bytes", "[1]", "confused the reader"},
+      {"bytes", "{\"KOVAMDTitle\":\"x", "confused the reader"},
   };
   uint64_t read = 0;
   for (const auto& row : rows) {
@@ -83,6 +85,14 @@ TEST_F(WorkerPoolTest, EachBadFileIsBlamedOnceAndTheNextIsRead) {
     read += 2;
   }
   EXPECT_EQ(read, pool.Status()["files"].asUInt64());
+}
+
+TEST_F(WorkerPoolTest, ASilentWorkerIsEnded) {
+  WorkerPool::Options options = TestOptions();
+  options.longest_read = 200ms;
+  WorkerPool pool(options);
+  EXPECT_EQ("took too long", Read(pool, "hang").fields["_KOVAExtractError"].asString());
+  EXPECT_EQ(0U, pool.Status()["workers"].asUInt());
 }
 
 TEST_F(WorkerPoolTest, AnAnswerIsNeverTakenForAnotherFiles) {

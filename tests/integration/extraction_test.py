@@ -1,0 +1,110 @@
+"""How the index depends on content extraction: it waits for it, uses it again, and does not trust it."""
+
+import os
+import re
+import signal
+import unittest
+
+from instance import InstanceTestCase, wait_for, write
+
+DAEMON = "kovacontentextractd"
+NOBODY = 65534
+
+
+class ExtractionTest(InstanceTestCase):
+    def indexed(self, **files):
+        self.ctl("up")
+        folder = self.instance.add_share("docs", "--no-index")
+        for name, text in files.items():
+            write(f"{folder}/{name}.txt", text)
+        self.ctl("folder", "add", "/docs")
+        return folder
+
+    def docs(self):
+        return self.instance.share_status("docs")
+
+    def fields(self, folder, *names):
+        return {os.path.basename(entry["KOVAMDPath"]): {name: entry.get(name) for name in names}
+                for entry in self.instance.entries("docs", folder, "KOVAMDPath", *names)}
+
+    def worker_pids(self):
+        pid = self.instance.pid(DAEMON)
+        found = []
+        for task in os.listdir(f"/proc/{pid}/task"):
+            with open(f"/proc/{pid}/task/{task}/children", encoding="ascii") as file:
+                found += [int(child) for child in file.read().split()]
+        return found
+
+    def test_indexing_waits_until_content_can_be_read(self):
+        folder = self.indexed(a="zeppelin")
+        self.instance.wait_idle("docs", folder)
+        self.instance.kill(DAEMON)
+        socket = f"{self.instance.root}/var/run/{DAEMON}.sock"
+        os.remove(socket)
+        os.makedirs(f"{socket}/occupied")  # nothing can be served there
+        write(f"{folder}/b.txt", "balloon")
+        self.ctl("index", "docs")
+        wait_for(lambda: self.docs()["state"] == "waiting for content extraction", "the daemon to notice")
+        state = self.docs()
+        self.assertRegex(state["detail"], "content cannot be read: .*" + re.escape(socket))
+        self.assertEqual(0, state["failed"])
+        self.assertEqual(["a.txt"], list(self.fields(folder)))
+        os.removedirs(f"{socket}/occupied")
+        wait_for(lambda: self.docs()["state"] == "idle", "indexing to go on by itself")
+        self.assertEqual([os.fsencode(f"{folder}/b.txt")], self.instance.search("balloon"))
+
+    def test_killed_daemon_and_workers_cost_no_file(self):
+        folder = self.indexed(**{f"file{i}": "zeppelin " * 20000 for i in range(300)})
+        for number in (signal.SIGKILL, signal.SIGTERM):
+            wait_for(lambda: self.instance.status()["content_extraction"] is not None, "content to be read")
+            os.kill(self.instance.pid(DAEMON), number)
+        self.instance.wait_idle("docs", folder)
+        errors = {name: fields for name, fields in self.fields(folder, "_KOVAExtractError").items()
+                  if fields["_KOVAExtractError"]}
+        self.assertEqual({}, errors)
+        self.assertEqual(300, len(self.instance.search("zeppelin")))
+
+    def test_blamed_file_is_tried_again_by_a_newer_reader_only(self):
+        folder = self.indexed(older="zeppelin", same="balloon", fine="glider")
+        self.instance.wait_idle("docs", folder)
+        versions = self.fields(folder, "_KOVAExtractVersion")
+        self.assertEqual({"_KOVAExtractVersion": 1}, versions["same.txt"])
+        for name, version, error in (("older", 0, "crashed the reader"), ("same", 1, "crashed the reader")):
+            change = {"_KOVAExtractVersion": version, "_KOVAExtractError": error}
+            reply = self.instance.ask("kovaelasticd", {"command": "document_set_by_id", "data": {
+                "id": "fileindex_docs", "doc_id": f"{folder}/{name}.txt", "data": change}})
+            self.assertTrue(reply["success"], reply)
+        self.assertIn(b"indexed by name only: 2 crashed the reader", self.commit_and_status())
+        written = self.docs()["written"]
+        self.ctl("index", "docs", "--wait")
+        self.assertEqual({"older.txt": {"_KOVAExtractError": None}, "same.txt": {"_KOVAExtractError": "crashed the reader"},
+                          "fine.txt": {"_KOVAExtractError": None}}, self.fields(folder, "_KOVAExtractError"))
+        self.assertEqual(written + 1, self.docs()["written"])
+        write(f"{folder}/same.txt", "balloon changed")
+        self.ctl("index", "docs", "--wait")
+        self.assertIsNone(self.fields(folder, "_KOVAExtractError")["same.txt"]["_KOVAExtractError"])
+
+    def commit_and_status(self):
+        self.instance.ask("kovaelasticd", {"command": "commit", "data": {"id": "fileindex_docs"}})
+        return self.ctl("status")
+
+    def test_workers_have_no_rights(self):
+        folder = self.indexed(a="zeppelin")
+        self.instance.wait_idle("docs", folder)
+        status = self.instance.status()["content_extraction"]
+        self.assertEqual((1, 0), (status["files"], status["blamed"]))
+        self.assertRegex(self.ctl("status"), b"content extraction: runs, process [0-9]+, 1 of at most [0-9]+ workers, 1 files")
+        for pid in self.worker_pids():
+            with open(f"/proc/{pid}/status", encoding="ascii") as file:
+                facts = dict(line.split(":\t", 1) for line in file.read().splitlines() if ":\t" in line)
+            self.assertEqual("0000000000000000", facts["CapEff"])
+            self.assertEqual("1", facts["NoNewPrivs"])
+            if "seccomp" not in status["missing"]:
+                self.assertEqual("2", facts["Seccomp"])
+            if os.geteuid() == 0:
+                self.assertEqual([str(NOBODY)] * 4, facts["Uid"].split())
+                self.assertNotEqual(os.stat("/"), os.stat(f"/proc/{pid}/root/"))
+
+
+if __name__ == "__main__":
+    unittest.main()
