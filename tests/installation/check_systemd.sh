@@ -6,7 +6,7 @@ build=$1
 system=$(mktemp -d)
 trap 'rm -rf "$system"' EXIT
 
-debootstrap --variant=minbase --include=systemd,systemd-sysv,libjsoncpp25,libsqlite3-0,libzstd1,libuchardet0 bookworm \
+debootstrap --variant=minbase --include=systemd,systemd-sysv,libjsoncpp25,libsqlite3-0,libzstd1,libuchardet0,libseccomp2,libmagic1 bookworm \
   "$system" >"$build/systemd-image.log"
 DESTDIR=$system cmake --install "$build" --prefix /usr >/dev/null
 systemctl --root="$system" --quiet enable kovaelasticd.service kovanotifyd.service fileindex-prepare.service
