@@ -1,0 +1,36 @@
+#pragma once
+
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "services/kovacontentextractd/readers/xml_tokenizer.h"
+#include "services/kovacontentextractd/readers/zip_container.h"
+
+/// What the kinds of Office Open XML share: parts that point to others by relations, paragraphs, properties.
+namespace ferrox::extract {
+
+struct Relation {
+  std::string id;
+  std::string type;    ///< the last component of its address, for example "notesSlide"
+  std::string target;  ///< the name of the member
+};
+
+/// The relations of a part to others in the container; those of the container itself for an empty name.
+std::vector<Relation> ReadRelations(ZipContainer& zip, std::string_view part);
+/// The member that a relation points to; empty when there is none of that id.
+std::string TargetById(const std::vector<Relation>& relations, std::string_view id);
+std::string TargetByType(const std::vector<Relation>& relations, std::string_view type);
+
+/// Adds the text of a part's paragraphs. False when the findings take no more.
+bool AddParagraphs(ZipContainer& zip, std::string_view part, Findings& findings);
+
+/// Sets title, authors, keywords and the like from the parts that the container names for them.
+void AddProperties(ZipContainer& zip, const std::vector<Relation>& relations, Findings& findings);
+
+// The main parts of each kind.
+void ReadWordDocument(ZipContainer& zip, const std::string& part, Findings& findings);
+void ReadWorkbook(ZipContainer& zip, const std::string& part, Findings& findings);
+void ReadPresentation(ZipContainer& zip, const std::string& part, Findings& findings);
+
+}  // namespace ferrox::extract

@@ -1,0 +1,45 @@
+#include <memory>
+
+#include "services/kovacontentextractd/readers/office_package.h"
+
+namespace ferrox::extract {
+
+namespace {
+
+using Token = XmlTokenizer::Token;
+
+constexpr size_t kSlidesMax = 20000;
+
+/// The ids of the slides' relations, in the order in which they are shown.
+std::vector<std::string> SlideIds(ZipContainer& zip, const std::string& part) {
+  std::vector<std::string> ids;
+  const std::unique_ptr<ByteSource> member = zip.Open(part);
+  if (member == nullptr) return ids;
+  XmlTokenizer xml(*member);
+  for (Token token = xml.Next(); token != Token::kEnd && token != Token::kBad; token = xml.Next()) {
+    if (token == Token::kOpen && xml.Name() == "sldId" && ids.size() < kSlidesMax) {
+      ids.emplace_back(xml.PrefixedAttribute("id"));
+    }
+  }
+  return ids;
+}
+
+}  // namespace
+
+void ReadPresentation(ZipContainer& zip, const std::string& part, Findings& findings) {
+  const std::vector<Relation> relations = ReadRelations(zip, part);
+  const std::vector<std::string> ids = SlideIds(zip, part);
+  if (!ids.empty()) findings.SetInteger("KOVAMDNumberOfPages", static_cast<int64_t>(ids.size()));
+  for (const std::string& id : ids) {
+    const std::string slide = TargetById(relations, id);
+    if (slide.empty()) continue;
+    if (!AddParagraphs(zip, slide, findings)) return;
+    for (const Relation& relation : ReadRelations(zip, slide)) {
+      const bool wanted =
+          relation.type == "notesSlide" || relation.type == "comments" || relation.type == "diagramData";
+      if (wanted && !AddParagraphs(zip, relation.target, findings)) return;
+    }
+  }
+}
+
+}  // namespace ferrox::extract

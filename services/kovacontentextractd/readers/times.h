@@ -1,0 +1,23 @@
+#pragma once
+
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <string_view>
+
+namespace ferrox::extract {
+
+struct CivilTime {
+  int64_t year = 0;
+  int month = 1, day = 1, hour = 0, minute = 0, second = 0;
+};
+
+/// Seconds since 1970 of a time in UTC; nothing when there is no such time.
+std::optional<int64_t> ToSeconds(const CivilTime& time);
+CivilTime FromSeconds(int64_t seconds);
+
+/// Reads "2024-03-01T10:11:12.5+02:00" and what is shorter, down to the year; the date's parts may stand between ":" as
+/// well, as cameras write them, and a blank for the "T". Without a zone, as UTC.
+std::optional<int64_t> ParseTime(std::string_view text);
+
+}  // namespace ferrox::extract

@@ -1,0 +1,93 @@
+#pragma once
+
+#include <array>
+#include <cstddef>
+#include <string>
+#include <string_view>
+#include <utility>
+#include <vector>
+
+#include "services/kovacontentextractd/readers/byte_source.h"
+
+namespace ferrox::extract {
+
+/// XML piece by piece, with constant memory whatever the size of the document and of anything in it. There are no
+/// document types and no entities but the five predefined ones and numbers: a document type is passed over unread, and
+/// a reference to anything else is nothing. UTF-8, and UTF-16 with a mark or by its first character. What is not well
+/// formed is read as far as it can be; namespaces are not resolved.
+class XmlTokenizer {
+ public:
+  enum class Token {
+    kOpen,   ///< an element begins: Name, Attribute
+    kClose,  ///< it ends: Name; also behind an empty element's kOpen
+    kText,   ///< a piece of text: Text; one text may come in several, none of which cuts a character
+    kEnd,    ///< the end of the document, or of what can be read of it
+    kBad,    ///< too deep, or not XML: nothing more comes
+  };
+  static constexpr int kDepthMax = 256;
+
+  explicit XmlTokenizer(ByteSource& source);
+  XmlTokenizer(const XmlTokenizer&) = delete;
+  XmlTokenizer& operator=(const XmlTokenizer&) = delete;
+
+  Token Next();
+  /// Passes the rest of the element that was opened last, with its end.
+  void SkipElement();
+
+  /// Without its prefix. Valid, as all that follows, until the next call of Next.
+  std::string_view Name() const { return LocalName(name_); }
+  std::string_view Text() const { return text_; }
+  /// By the whole name, with its prefix; empty when there is none.
+  std::string_view Attribute(std::string_view name) const;
+  /// By the name behind any prefix, but only of those that have one.
+  std::string_view PrefixedAttribute(std::string_view local_name) const;
+  int Depth() const { return depth_; }
+
+ private:
+  enum class Charset { kUnknown, kUtf8, kUtf16Little, kUtf16Big };
+  struct NamedValue {
+    std::string name;
+    std::string value;
+  };
+
+  static std::string_view LocalName(std::string_view name);
+  bool Refill();
+  void DetectCharset();
+  void FillUtf16();
+  bool Has(size_t count);
+  bool StartsWith(std::string_view text);
+  bool SkipPast(std::string_view end);
+  bool SkipDocumentType();
+  void SkipBlanks();
+  std::string_view Rest() const { return {buffer_.data() + begin_, end_ - begin_}; }
+  Token ReadText();
+  Token ReadReference();
+  Token ReadCData();
+  Token ReadMarkup();
+  Token ReadTag();
+  Token CloseElement();
+  void ReadName(std::string& name);
+  void ReadAttribute();
+  void ReadValue(char quote, std::string& value);
+  size_t Resolve(std::string& out);
+  Token Bad();
+
+  ByteSource& source_;
+  Charset charset_ = Charset::kUnknown;
+  std::array<char, 16384> buffer_;
+  std::array<char, 4096> wide_;  ///< UTF-16 that is not converted yet
+  size_t wide_size_ = 0;
+  size_t begin_ = 0, end_ = 0;
+  bool source_ended_ = false;
+  bool in_cdata_ = false;
+  bool close_pending_ = false;  ///< behind an empty element
+  bool bad_ = false;
+  int depth_ = 0;
+  std::string name_;
+  std::vector<NamedValue> attributes_;
+  size_t attribute_count_ = 0;  ///< of attributes_: the others keep their memory
+  std::string reference_;
+  std::string_view text_;
+};
+
+}  // namespace ferrox::extract

@@ -1,0 +1,48 @@
+#pragma once
+
+#include <memory>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "services/kovacontentextractd/readers/byte_source.h"
+#include "services/kovacontentextractd/readers/reader.h"
+
+struct zip;
+
+namespace ferrox::extract {
+
+/// The members of a ZIP file, unpacked as they are read and within the limits: those of a member, and the expansion of
+/// all that is unpacked together. What goes wrong is said to the findings, and ends the member.
+class ZipContainer {
+ public:
+  ZipContainer(const Source& source, Findings& findings);
+  ~ZipContainer();
+  ZipContainer(const ZipContainer&) = delete;
+  ZipContainer& operator=(const ZipContainer&) = delete;
+
+  bool IsOpen() const { return archive_ != nullptr; }
+  bool Has(std::string_view name) const;
+  /// The member `name`, the first one where several have it; null when there is none, it is encrypted or in an unknown
+  /// packing, and after a limit was reached. Members may not outlive the container.
+  std::unique_ptr<ByteSource> Open(std::string_view name);
+  /// Up to `limit_bytes` of a small member; empty when it cannot be read.
+  std::string ReadMember(std::string_view name, size_t limit_bytes);
+  /// The names that begin and end so, those with numbers in them in the order of their numbers; at most `limit`.
+  std::vector<std::string> Names(std::string_view begin, std::string_view end, size_t limit = 10000) const;
+
+ private:
+  friend class ZipMember;
+
+  /// Whether `bytes` more may be unpacked.
+  bool Spend(uint64_t bytes);
+
+  Findings& findings_;
+  uint64_t file_bytes_;
+  uint64_t packed_bytes_ = 0;    ///< of the members opened so far
+  uint64_t unpacked_bytes_ = 0;  ///< of what was read of them
+  bool exhausted_ = false;
+  struct zip* archive_ = nullptr;
+};
+
+}  // namespace ferrox::extract
