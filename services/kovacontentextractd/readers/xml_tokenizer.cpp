@@ -233,7 +233,7 @@ size_t XmlTokenizer::Resolve(std::string& out) {
 XmlTokenizer::Token XmlTokenizer::ReadReference() {
   reference_.clear();
   const size_t length = Resolve(reference_);
-  if (length == 0) reference_ = "&";
+  if (length == 0) reference_.push_back('&');
   begin_ += std::max<size_t>(length, 1);
   text_ = reference_;
   return Token::kText;

@@ -1,0 +1,146 @@
+#include "services/kovacontentextractd/readers/pdf/pdf.h"
+
+#include <exception>
+#include <iterator>
+#include <memory>
+#include <new>
+#include <poppler-document.h>
+#include <poppler-global.h>
+#include <poppler-page.h>
+#include <string>
+
+#include "services/kovacontentextractd/readers/mapped_file.h"
+#include "services/kovacontentextractd/readers/pdf/xmp_packet.h"
+#include "services/kovacontentextractd/readers/utf8.h"
+
+namespace ferrox::extract {
+
+namespace {
+
+using Document = std::unique_ptr<poppler::document>;
+
+void IgnoreComplaint(const std::string&, void*) {}
+
+/// The library's texts are UTF-16; done here, they need no converter of the C library.
+std::string Utf8(const poppler::ustring& text) {
+  std::string out;
+  out.reserve(text.size() * 2);
+  for (size_t i = 0; i < text.size(); ++i) {
+    uint32_t code = text[i];
+    if (code >= 0xD800 && code <= 0xDBFF && i + 1 < text.size() && (text[i + 1] & 0xFC00) == 0xDC00) {
+      code = 0x10000 + ((code & 0x3FF) << 10) + (text[++i] & 0x3FFU);
+    }
+    AppendUtf8(out, code);
+  }
+  return out;
+}
+
+/// The library widens each byte of a packet without looking at its encoding.
+std::string Packet(const poppler::ustring& widened) {
+  std::string bytes;
+  for (const uint16_t unit : widened) bytes += static_cast<char>(unit);
+  return bytes;
+}
+
+void AddTime(const char* field, time_t seconds, Findings& findings) {
+  if (seconds != static_cast<time_t>(-1)) findings.SetInteger(field, seconds);
+}
+
+void AddInformation(const poppler::document& document, Findings& findings) {
+  AddXmpPacket(Packet(document.metadata()), findings);
+  findings.Set("KOVAMDTitle", Utf8(document.get_title()));
+  findings.Set("KOVAMDAuthors", Utf8(document.get_author()));
+  findings.Set("KOVAMDDescription", Utf8(document.get_subject()));
+  findings.Set("KOVAMDKeywords", Utf8(document.get_keywords()));
+  findings.Set("KOVAMDCreator", Utf8(document.get_creator()));
+  findings.Set("KOVAMDEncodingApplications", Utf8(document.get_producer()));
+  AddTime("KOVAMDContentCreationDate", document.get_creation_date_t(), findings);
+  AddTime("KOVAMDContentModificationDate", document.get_modification_date_t(), findings);
+  findings.SetInteger("KOVAMDNumberOfPages", document.pages());
+  int major = 0, minor = 0;
+  document.get_pdf_version(&major, &minor);
+  findings.Set("KOVAMDVersion", std::to_string(major) + "." + std::to_string(minor));
+  if (document.is_encrypted()) findings.Set("KOVAMDSecurityMethod", "Password Encrypted");
+}
+
+void AddPages(const poppler::document& document, Findings& findings) {
+  for (int i = 0; i < document.pages(); ++i) {
+    const std::unique_ptr<poppler::page> page(document.create_page(i));
+    if (page == nullptr) {
+      findings.Fail("damaged");
+      continue;
+    }
+    if (i == 0) {
+      const poppler::rectf size = page->page_rect();
+      findings.SetNumber("KOVAMDPageWidth", size.width());
+      findings.SetNumber("KOVAMDPageHeight", size.height());
+    }
+    if (!findings.AddText(Utf8(page->text({}, poppler::page::non_raw_non_physical_layout)))) return;
+    findings.Break();
+  }
+}
+
+/// A page with one character in each of the four collections of East Asian characters, in the commonest encoding of
+/// each: as many as the library keeps tables of.
+std::string EastAsianPdf() {
+  static constexpr const char* kFonts[][2] = {
+      {"GB1", "GBK-EUC-H"}, {"CNS1", "ETen-B5-H"}, {"Japan1", "90ms-RKSJ-H"}, {"Korea1", "KSCms-UHC-H"}};
+  std::string fonts, content = "BT";
+  int count = 0;
+  for (const auto& [collection, encoding] : kFonts) {
+    const std::string name = "/F" + std::to_string(count++);
+    fonts += name + "<</Type/Font/Subtype/Type0/BaseFont/A/Encoding/" + encoding +
+             "/DescendantFonts[<</Type/Font/Subtype/CIDFontType0/BaseFont/A/CIDSystemInfo<</Registry(Adobe)/Ordering(" +
+             collection + ")/Supplement 0>>/FontDescriptor<</Type/FontDescriptor/FontName/A/Flags 4>>>>]>>";
+    content += name + " 9 Tf<B0A1>Tj";
+  }
+  content += " ET";
+  const std::string objects[] = {
+      "<</Type/Catalog/Pages 2 0 R>>", "<</Type/Pages/Kids[3 0 R]/Count 1>>",
+      "<</Type/Page/Parent 2 0 R/MediaBox[0 0 99 99]/Contents 4 0 R/Resources<</Font<<" + fonts + ">>>>>>",
+      "<</Length " + std::to_string(content.size()) + ">>stream\n" + content + "\nendstream"};
+  std::string pdf = "%PDF-1.4\n", table = "xref\n0 5\n0000000000 65535 f \n";
+  for (size_t i = 0; i < std::size(objects); ++i) {
+    const std::string offset = std::to_string(pdf.size());
+    table += std::string(10 - offset.size(), '0') + offset + " 00000 n \n";
+    pdf += std::to_string(i + 1) + " 0 obj" + objects[i] + "endobj\n";
+  }
+  return pdf + table + "trailer<</Root 1 0 R/Size 5>>startxref\n" + std::to_string(pdf.size()) + "\n%%EOF";
+}
+
+void ReadDocument(const char* bytes, size_t size, Findings& findings) {
+  const Document document(poppler::document::load_from_raw_data(bytes, static_cast<int>(size)));
+  if (document == nullptr) return findings.Fail("damaged");
+  if (document->is_locked()) return findings.Fail("encrypted");
+  AddInformation(*document, findings);
+  AddPages(*document, findings);
+}
+
+}  // namespace
+
+void PreparePdf() {
+  // What was loaded stays loaded as long as a document is open.
+  static const Document* keeper = nullptr;
+  if (keeper != nullptr) return;
+  static const std::string bytes = EastAsianPdf();
+  poppler::set_debug_error_function(&IgnoreComplaint, nullptr);
+  keeper = new Document(poppler::document::load_from_raw_data(bytes.data(), static_cast<int>(bytes.size())));
+  const std::unique_ptr<poppler::page> page(*keeper != nullptr ? (*keeper)->create_page(0) : nullptr);
+  if (page != nullptr) (void)page->text();
+}
+
+void ReadPdf(const Source& source, Findings& findings) {
+  poppler::set_debug_error_function(&IgnoreComplaint, nullptr);
+  const MappedFile file(source);
+  if (!file.IsWhole()) return findings.Fail("too large");
+  if (file.Data() == nullptr) return findings.Fail("damaged");
+  try {
+    ReadDocument(reinterpret_cast<const char*>(file.Data()), file.Size(), findings);
+  } catch (const std::bad_alloc&) {
+    findings.Fail("needs too much memory");
+  } catch (const std::exception&) {
+    findings.Fail("damaged");
+  }
+}
+
+}  // namespace ferrox::extract

@@ -1,0 +1,53 @@
+#include "services/kovacontentextractd/readers/pdf/xmp_packet.h"
+
+#include "services/kovacontentextractd/readers/property_fields.h"
+#include "services/kovacontentextractd/readers/xml_tokenizer.h"
+
+namespace ferrox::extract {
+
+namespace {
+
+using Token = XmlTokenizer::Token;
+
+constexpr PropertyField kFields[] = {
+    {"title", "KOVAMDTitle"},        {"creator", "KOVAMDAuthors"}, {"description", "KOVAMDDescription"},
+    {"subject", "KOVAMDKeywords"},   {"rights", "KOVAMDRights"},   {"publisher", "KOVAMDPublishers"},
+    {"language", "KOVAMDLanguages"},
+};
+
+class PacketSource : public ByteSource {
+ public:
+  explicit PacketSource(const std::string& bytes) : bytes_(bytes) {}
+  size_t Read(char* buffer, size_t room) override {
+    const size_t got = bytes_.copy(buffer, room, at_);
+    at_ += got;
+    return got;
+  }
+
+ private:
+  const std::string& bytes_;
+  size_t at_ = 0;
+};
+
+}  // namespace
+
+/// A property's values are the items of a list within its element.
+void AddXmpPacket(const std::string& packet, Findings& findings) {
+  PacketSource source(packet);
+  XmlTokenizer xml(source);
+  const PropertyField* property = nullptr;
+  std::string value;
+  for (Token token = xml.Next(); token != Token::kEnd && token != Token::kBad; token = xml.Next()) {
+    if (token == Token::kText) {
+      if (value.size() < (32U << 10)) value += xml.Text();
+      continue;
+    }
+    if (token == Token::kClose && xml.Name() == "li" && property != nullptr) SetProperty(*property, value, findings);
+    value.clear();
+    for (const PropertyField& known : kFields) {
+      if (known.element == xml.Name()) property = token == Token::kOpen ? &known : nullptr;
+    }
+  }
+}
+
+}  // namespace ferrox::extract

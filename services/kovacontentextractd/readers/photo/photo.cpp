@@ -1,0 +1,255 @@
+#include "services/kovacontentextractd/readers/photo/photo.h"
+
+#include <cmath>
+#include <exception>
+#include <exiv2/exiv2.hpp>
+#include <new>
+#include <string>
+
+#include "services/kovacontentextractd/readers/mapped_file.h"
+#include "services/kovacontentextractd/readers/times.h"
+#include "services/kovacontentextractd/readers/utf8.h"
+
+namespace ferrox::extract {
+
+namespace {
+
+enum class Kind { kText, kInteger, kNumber, kShown };
+
+struct Row {
+  const char* key;
+  const char* field;
+  Kind kind = Kind::kText;  ///< kShown: in the words that the library has for the number
+};
+
+// Of several rows for a field that is no list, the first one that the file has counts.
+constexpr Row kExifRows[] = {
+    {"Exif.Image.Make", "KOVAMDAcquisitionMake"},
+    {"Exif.Image.Model", "KOVAMDAcquisitionModel"},
+    {"Exif.Image.Software", "KOVAMDCreator"},
+    {"Exif.Image.ImageDescription", "KOVAMDDescription"},
+    {"Exif.Image.Copyright", "KOVAMDCopyright"},
+    {"Exif.Image.Artist", "KOVAMDAuthors"},
+    {"Exif.Image.Orientation", "KOVAMDOrientation", Kind::kInteger},
+    {"Exif.Image.XPTitle", "KOVAMDTitle", Kind::kShown},
+    {"Exif.Image.XPComment", "KOVAMDComment", Kind::kShown},
+    {"Exif.Image.XPKeywords", "KOVAMDKeywords", Kind::kShown},
+    {"Exif.Image.XPAuthor", "KOVAMDAuthors", Kind::kShown},
+    {"Exif.Image.Rating", "KOVAMDStarRating", Kind::kShown},
+    {"Exif.Photo.UserComment", "KOVAMDComment", Kind::kShown},
+    {"Exif.Photo.ExposureTime", "KOVAMDExposureTimeSeconds", Kind::kNumber},
+    {"Exif.Photo.FNumber", "KOVAMDFNumber", Kind::kNumber},
+    {"Exif.Photo.FNumber", "KOVAMDAperture", Kind::kShown},
+    {"Exif.Photo.MaxApertureValue", "KOVAMDMaxAperture", Kind::kNumber},
+    {"Exif.Photo.FocalLength", "KOVAMDFocalLength", Kind::kNumber},
+    {"Exif.Photo.ISOSpeedRatings", "KOVAMDISOSpeed", Kind::kInteger},
+    {"Exif.Photo.ExposureProgram", "KOVAMDExposureProgram", Kind::kShown},
+    {"Exif.Photo.ExposureMode", "KOVAMDExposureMode", Kind::kShown},
+    {"Exif.Photo.MeteringMode", "KOVAMDMeteringMode", Kind::kShown},
+    {"Exif.Photo.WhiteBalance", "KOVAMDWhiteBalance", Kind::kShown},
+    {"Exif.Photo.ColorSpace", "KOVAMDColorSpace", Kind::kShown},
+    {"Exif.Photo.ExifVersion", "KOVAMDEXIFVersion", Kind::kShown},
+    {"Exif.Image.BitsPerSample", "KOVAMDBitsPerSample", Kind::kInteger},
+};
+
+constexpr Row kIptcRows[] = {
+    {"Iptc.Application2.ObjectName", "KOVAMDTitle"},
+    {"Iptc.Application2.Headline", "KOVAMDHeadline"},
+    {"Iptc.Application2.Caption", "KOVAMDDescription"},
+    {"Iptc.Application2.Keywords", "KOVAMDKeywords"},
+    {"Iptc.Application2.Byline", "KOVAMDAuthors"},
+    {"Iptc.Application2.Copyright", "KOVAMDCopyright"},
+    {"Iptc.Application2.SpecialInstructions", "KOVAMDInstructions"},
+    {"Iptc.Application2.SubLocation", "KOVAMDNamedLocation"},
+    {"Iptc.Application2.City", "KOVAMDCity"},
+    {"Iptc.Application2.ProvinceState", "KOVAStateOrProvince"},
+    {"Iptc.Application2.CountryName", "KOVAMDCountry"},
+};
+
+constexpr Row kXmpRows[] = {
+    {"Xmp.dc.title", "KOVAMDTitle"},
+    {"Xmp.photoshop.Headline", "KOVAMDHeadline"},
+    {"Xmp.dc.description", "KOVAMDDescription"},
+    {"Xmp.dc.subject", "KOVAMDKeywords"},
+    {"Xmp.dc.creator", "KOVAMDAuthors"},
+    {"Xmp.dc.rights", "KOVAMDCopyright"},
+    {"Xmp.photoshop.Instructions", "KOVAMDInstructions"},
+    {"Xmp.iptc.Location", "KOVAMDNamedLocation"},
+    {"Xmp.photoshop.City", "KOVAMDCity"},
+    {"Xmp.photoshop.State", "KOVAStateOrProvince"},
+    {"Xmp.photoshop.Country", "KOVAMDCountry"},
+    {"Xmp.iptcExt.PersonInImage", "KOVAMDPeopleDisplayName"},
+    {"Xmp.xmp.Rating", "KOVAMDStarRating"},
+    {"Xmp.xmp.CreatorTool", "KOVAMDCreator"},
+};
+
+bool IsList(const std::string& field) {
+  return field == "KOVAMDKeywords" || field == "KOVAMDAuthors" || field == "KOVAMDPeopleDisplayName";
+}
+
+/// Collects fields so that of several sources the first one counts, and lists are joined.
+class Fields {
+ public:
+  explicit Fields(Findings& findings) : findings_(findings) {}
+
+  void Add(const char* field, const std::string& text) {
+    const std::string clean = Cleaned(text);
+    if (clean.empty()) return;
+    if (IsList(field)) return findings_.Append(field, clean);
+    if (values_.isMember(field)) return;
+    values_[field] = clean;
+    findings_.Set(field, clean);
+  }
+  std::string Value(const char* field) const { return values_.get(field, "").asString(); }
+
+ private:
+  /// Without blanks at the end, which cameras fill up with; what is not UTF-8 is read as Latin-1.
+  static std::string Cleaned(std::string text) {
+    text.resize(text.find_last_not_of(std::string_view("\0 \t\r\n", 5)) + 1);
+    if (IsUtf8(text, false)) return text;
+    std::string out;
+    for (const char c : text) AppendUtf8(out, static_cast<unsigned char>(c));
+    return out;
+  }
+
+  Findings& findings_;
+  Json::Value values_;
+};
+
+/// The items of a value one by one: lists of names, texts in several languages.
+void AddValue(const Row& row, const Exiv2::Value& value, Fields& fields) {
+  constexpr long kItemsMax = 1000;
+  if (value.typeId() == Exiv2::langAlt) {
+    const auto& texts = static_cast<const Exiv2::LangAltValue&>(value);
+    return fields.Add(row.field, texts.value_.empty() ? std::string() : texts.value_.begin()->second);
+  }
+  if (value.typeId() != Exiv2::xmpBag && value.typeId() != Exiv2::xmpSeq)
+    return fields.Add(row.field, value.toString());
+  for (long i = 0; i < std::min(value.count(), kItemsMax); ++i) fields.Add(row.field, value.toString(i));
+}
+
+void AddExif(const Exiv2::ExifData& exif, Fields& fields, Findings& findings) {
+  for (const Row& row : kExifRows) {
+    const auto found = exif.findKey(Exiv2::ExifKey(row.key));
+    if (found == exif.end() || found->count() == 0) continue;
+    if (row.kind == Kind::kInteger) {
+      findings.SetInteger(row.field, found->toLong());
+    } else if (row.kind == Kind::kNumber) {
+      findings.SetNumber(row.field, static_cast<double>(found->toFloat()));
+    } else if (row.kind == Kind::kShown) {
+      fields.Add(row.field, found->print(&exif));
+    } else {
+      AddValue(row, found->value(), fields);
+    }
+  }
+}
+
+template <typename Data, typename Key, size_t Count>
+void AddRows(const Data& data, const Row (&rows)[Count], Fields& fields) {
+  for (const Row& row : rows) {
+    const Key key(row.key);
+    for (const auto& datum : data) {
+      if (datum.key() == key.key()) AddValue(row, datum.value(), fields);
+    }
+  }
+}
+
+std::string TextOf(const Exiv2::ExifData& exif, const char* key) {
+  const auto found = exif.findKey(Exiv2::ExifKey(key));
+  return found != exif.end() ? found->toString() : std::string();
+}
+
+void AddTimes(const Exiv2::ExifData& exif, const Exiv2::XmpData& xmp, Findings& findings) {
+  auto taken = ParseTime(TextOf(exif, "Exif.Photo.DateTimeOriginal") + TextOf(exif, "Exif.Photo.OffsetTimeOriginal"));
+  if (!taken.has_value()) taken = ParseTime(TextOf(exif, "Exif.Photo.DateTimeDigitized"));
+  const auto created = xmp.findKey(Exiv2::XmpKey("Xmp.xmp.CreateDate"));
+  if (!taken.has_value() && created != xmp.end()) taken = ParseTime(created->toString());
+  const auto changed = ParseTime(TextOf(exif, "Exif.Image.DateTime") + TextOf(exif, "Exif.Photo.OffsetTime"));
+  if (!taken.has_value()) taken = changed;
+  if (taken.has_value()) findings.SetInteger("KOVAMDContentCreationDate", *taken);
+  if (changed.has_value()) findings.SetInteger("KOVAMDContentModificationDate", *changed);
+}
+
+/// Exposures are shown as photographers write them: "1/250", "2".
+void AddExposure(const Exiv2::ExifData& exif, Findings& findings) {
+  const auto found = exif.findKey(Exiv2::ExifKey("Exif.Photo.ExposureTime"));
+  if (found != exif.end() && found->count() > 0) {
+    const double seconds = static_cast<double>(found->toFloat());
+    if (seconds > 0 && seconds < 1) {
+      findings.Set("KOVAMDExposureTimeString", "1/" + std::to_string(std::llround(std::min(1 / seconds, 1e9))));
+    } else if (seconds >= 1 && seconds < 1e9) {
+      findings.Set("KOVAMDExposureTimeString", std::to_string(std::llround(seconds)));
+    }
+  }
+  const auto flash = exif.findKey(Exiv2::ExifKey("Exif.Photo.Flash"));
+  if (flash != exif.end() && flash->count() > 0) findings.SetInteger("KOVAMDFlashOnOff", flash->toLong() & 1);
+}
+
+void AddResolution(const Exiv2::ExifData& exif, Findings& findings) {
+  const auto unit = exif.findKey(Exiv2::ExifKey("Exif.Image.ResolutionUnit"));
+  const float inches = unit != exif.end() && unit->count() > 0 && unit->toLong() == 3 ? 2.54F : 1.0F;
+  const auto add = [&](const char* key, const char* field) {
+    const auto found = exif.findKey(Exiv2::ExifKey(key));
+    if (found == exif.end() || found->count() == 0) return;
+    const float value = found->toFloat() * inches;
+    if (value > 0 && value < 1e6F) findings.SetInteger(field, std::lround(value));
+  };
+  add("Exif.Image.XResolution", "KOVAMDResolutionWidthDPI");
+  add("Exif.Image.YResolution", "KOVAMDResolutionHeightDPI");
+}
+
+void AddPixels(const Exiv2::Image& image, Findings& findings) {
+  const int64_t width = image.pixelWidth(), height = image.pixelHeight();
+  if (width <= 0 || height <= 0) return;
+  findings.SetInteger("KOVAMDPixelWidth", width);
+  findings.SetInteger("KOVAMDPixelHeight", height);
+  findings.SetInteger("KOVAMDPixelCount", width * height);
+}
+
+/// The names of the place together, from the nearest to the widest.
+void AddPlace(const Fields& fields, Findings& findings) {
+  std::string place;
+  for (const char* field : {"KOVAMDNamedLocation", "KOVAMDCity", "KOVAStateOrProvince", "KOVAMDCountry"}) {
+    const std::string name = fields.Value(field);
+    if (!name.empty()) place += (place.empty() ? "" : ", ") + name;
+  }
+  findings.Set("KOVAMDNamedLocation", place);
+}
+
+void ReadImage(const MappedFile& file, Findings& findings) {
+  const auto image = Exiv2::ImageFactory::open(file.Data(), static_cast<long>(file.Size()));
+  image->readMetadata();
+  Fields fields(findings);
+  AddPixels(*image, findings);
+  // What people wrote with programs counts more than what cameras put there.
+  AddRows<Exiv2::XmpData, Exiv2::XmpKey>(image->xmpData(), kXmpRows, fields);
+  AddRows<Exiv2::IptcData, Exiv2::IptcKey>(image->iptcData(), kIptcRows, fields);
+  AddExif(image->exifData(), fields, findings);
+  AddTimes(image->exifData(), image->xmpData(), findings);
+  AddExposure(image->exifData(), findings);
+  AddResolution(image->exifData(), findings);
+  AddPlace(fields, findings);
+}
+
+}  // namespace
+
+void PreparePhoto() {
+  Exiv2::LogMsg::setLevel(Exiv2::LogMsg::mute);
+  Exiv2::XmpParser::initialize();
+  Exiv2::enableBMFF(true);
+}
+
+void ReadPhoto(const Source& source, Findings& findings) {
+  PreparePhoto();
+  const MappedFile file(source);
+  if (file.Data() == nullptr) return findings.Fail("damaged");
+  try {
+    ReadImage(file, findings);
+  } catch (const std::bad_alloc&) {
+    findings.Fail("needs too much memory");
+  } catch (const std::exception&) {
+    findings.Fail("damaged");
+  }
+}
+
+}  // namespace ferrox::extract
