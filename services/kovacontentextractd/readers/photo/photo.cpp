@@ -6,9 +6,9 @@
 #include <new>
 #include <string>
 
+#include "services/kovacontentextractd/readers/latin1.h"
 #include "services/kovacontentextractd/readers/mapped_file.h"
 #include "services/kovacontentextractd/readers/times.h"
-#include "services/kovacontentextractd/readers/utf8.h"
 
 namespace ferrox::extract {
 
@@ -106,10 +106,7 @@ class Fields {
   /// Without blanks at the end, which cameras fill up with; what is not UTF-8 is read as Latin-1.
   static std::string Cleaned(std::string text) {
     text.resize(text.find_last_not_of(std::string_view("\0 \t\r\n", 5)) + 1);
-    if (IsUtf8(text, false)) return text;
-    std::string out;
-    for (const char c : text) AppendUtf8(out, static_cast<unsigned char>(c));
-    return out;
+    return Utf8OrLatin1(text);
   }
 
   Findings& findings_;

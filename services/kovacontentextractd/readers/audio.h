@@ -1,0 +1,13 @@
+#pragma once
+
+#include "services/kovacontentextractd/readers/reader.h"
+
+namespace ferrox::extract {
+
+/// Tags and properties of music and other sound: MP3, FLAC, Ogg, Opus, M4A, WAV, AIFF, APE, WMA, DSF and more.
+void ReadAudio(const Source& source, Findings& findings);
+
+/// Sets up what the reader needs; reading needs no file.
+void PrepareAudio();
+
+}  // namespace ferrox::extract

@@ -1,0 +1,36 @@
+#pragma once
+
+#include <string>
+#include <taglib/tiostream.h>
+
+#include "services/kovacontentextractd/readers/byte_source.h"
+
+namespace ferrox::extract {
+
+/// A part of a file as the tag library wants it: read only, and never more at a time than a tag may have.
+class AudioStream : public TagLib::IOStream {
+ public:
+  AudioStream(const Source& source, uint64_t begin, uint64_t end, std::string name);
+
+  TagLib::FileName name() const override { return name_.c_str(); }
+  TagLib::ByteVector readBlock(unsigned long length) override;
+  void seek(long offset, Position from) override;
+  long tell() const override { return at_; }
+  long length() override { return length_; }
+  bool readOnly() const override { return true; }
+  bool isOpen() const override { return true; }
+
+  void writeBlock(const TagLib::ByteVector&) override {}
+  void insert(const TagLib::ByteVector&, unsigned long, unsigned long) override {}
+  void removeBlock(unsigned long, unsigned long) override {}
+  void truncate(long) override {}
+
+ private:
+  FileBytes file_;
+  uint64_t begin_;
+  long length_;  ///< the library counts in long, so that on 32 bits a file ends at 2 GiB
+  long at_ = 0;
+  std::string name_;
+};
+
+}  // namespace ferrox::extract

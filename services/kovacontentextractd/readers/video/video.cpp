@@ -1,0 +1,154 @@
+#include "services/kovacontentextractd/readers/video/video.h"
+
+#include <MediaInfo/MediaInfo.h>
+#include <algorithm>
+#include <charconv>
+#include <exception>
+#include <new>
+#include <string>
+
+#include "services/kovacontentextractd/readers/byte_source.h"
+#include "services/kovacontentextractd/readers/latin1.h"
+#include "services/kovacontentextractd/readers/times.h"
+#include "services/kovacontentextractd/readers/utf8.h"
+
+namespace ferrox::extract {
+
+namespace {
+
+using MediaInfoLib::MediaInfo;
+using MediaInfoLib::stream_t;
+
+/// Of a film, what describes it is at its beginning and its end.
+constexpr uint64_t kReadMaxBytes = 64U << 20;
+constexpr int kJumpsMax = 1000;
+constexpr size_t kPieceBytes = 64U << 10;
+
+enum class Kind { kText, kInteger, kMilliseconds, kTime, kYear };
+
+struct Row {
+  stream_t stream;
+  const wchar_t* name;
+  const char* field;
+  Kind kind = Kind::kText;
+};
+
+constexpr Row kRows[] = {
+    {MediaInfoLib::Stream_General, L"Title", "KOVAMDTitle"},
+    {MediaInfoLib::Stream_General, L"Movie", "KOVAMDTitle"},
+    {MediaInfoLib::Stream_General, L"Album", "KOVAMDAlbum"},
+    {MediaInfoLib::Stream_General, L"Performer", "KOVAMDAuthors"},
+    {MediaInfoLib::Stream_General, L"Director", "KOVAMDContributors"},
+    {MediaInfoLib::Stream_General, L"Actor", "KOVAMDParticipants"},
+    {MediaInfoLib::Stream_General, L"Composer", "KOVAMDComposer"},
+    {MediaInfoLib::Stream_General, L"Genre", "KOVAMDMusicalGenre"},
+    {MediaInfoLib::Stream_General, L"Comment", "KOVAMDComment"},
+    {MediaInfoLib::Stream_General, L"Description", "KOVAMDDescription"},
+    {MediaInfoLib::Stream_General, L"Synopsis", "KOVAMDDescription"},
+    {MediaInfoLib::Stream_General, L"Keywords", "KOVAMDKeywords"},
+    {MediaInfoLib::Stream_General, L"Copyright", "KOVAMDCopyright"},
+    {MediaInfoLib::Stream_General, L"Publisher", "KOVAMDPublishers"},
+    {MediaInfoLib::Stream_General, L"Encoded_Application", "KOVAMDEncodingApplications"},
+    {MediaInfoLib::Stream_General, L"Recorded_Location", "KOVAMDNamedLocation"},
+    {MediaInfoLib::Stream_General, L"Duration", "KOVAMDDurationSecond", Kind::kMilliseconds},
+    {MediaInfoLib::Stream_General, L"OverallBitRate", "KOVAMDTotalBitRate", Kind::kInteger},
+    {MediaInfoLib::Stream_General, L"Recorded_Date", "KOVAMDRecordingYear", Kind::kYear},
+    {MediaInfoLib::Stream_General, L"Encoded_Date", "KOVAMDContentCreationDate", Kind::kTime},
+    {MediaInfoLib::Stream_General, L"Recorded_Date", "KOVAMDContentCreationDate", Kind::kTime},
+    {MediaInfoLib::Stream_Video, L"Width", "KOVAMDPixelWidth", Kind::kInteger},
+    {MediaInfoLib::Stream_Video, L"Height", "KOVAMDPixelHeight", Kind::kInteger},
+    {MediaInfoLib::Stream_Video, L"BitRate", "KOVAMDVideoBitRate", Kind::kInteger},
+    {MediaInfoLib::Stream_Audio, L"BitRate", "KOVAMDAudioBitRate", Kind::kInteger},
+    {MediaInfoLib::Stream_Audio, L"SamplingRate", "KOVAMDAudioSampleRate", Kind::kInteger},
+    {MediaInfoLib::Stream_Audio, L"Channel(s)", "KOVAMDAudioChannelCount", Kind::kInteger},
+};
+
+std::string Utf8(const std::wstring& text) {
+  std::string out;
+  for (const wchar_t c : text) AppendUtf8(out, static_cast<uint32_t>(c));
+  return WithoutDoubleEncoding(std::move(out));
+}
+
+std::string Value(MediaInfo& info, stream_t stream, size_t number, const wchar_t* name) {
+  return Utf8(info.Get(stream, number, name));
+}
+
+void SetRow(const Row& row, std::string value, Findings& findings) {
+  if (row.kind == Kind::kText) return findings.Append(row.field, value);
+  if (row.kind == Kind::kTime) {
+    if (value.starts_with("UTC ")) value.erase(0, 4);
+    const auto time = ParseTime(value).value_or(0);  // 0: a field that nobody filled
+    if (time > 0) findings.SetInteger(row.field, time);
+    return;
+  }
+  double number = 0;
+  const auto parsed = std::from_chars(value.data(), value.data() + value.size(), number);
+  if (parsed.ptr == value.data() || number <= 0 || number > 9e15) return;
+  if (row.kind == Kind::kMilliseconds) return findings.SetNumber(row.field, number / 1000);
+  if (row.kind == Kind::kInteger || number <= 9999) findings.SetInteger(row.field, static_cast<int64_t>(number));
+}
+
+void AddStreams(MediaInfo& info, Findings& findings) {
+  constexpr size_t kStreamsMax = 100;
+  const struct {
+    stream_t stream;
+    const char* type;
+  } kTypes[] = {{MediaInfoLib::Stream_Video, "Video"},
+                {MediaInfoLib::Stream_Audio, "Sound"},
+                {MediaInfoLib::Stream_Text, "Text"}};
+  for (const auto& row : kTypes) {
+    const size_t count = std::min(info.Count_Get(row.stream), kStreamsMax);
+    if (count > 0) findings.Append("KOVAMDMediaTypes", row.type);
+    for (size_t i = 0; i < count; ++i) {
+      findings.Append("KOVAMDCodecs", Value(info, row.stream, i, L"Format"));
+      findings.Append("KOVAMDLanguages", Value(info, row.stream, i, L"Language"));
+    }
+  }
+}
+
+/// Feeds the library, which says where it wants to read on.
+void Feed(MediaInfo& info, const Source& source) {
+  constexpr size_t kFinished = 8;
+  const FileBytes file(source);
+  std::string piece(kPieceBytes, '\0');
+  uint64_t at = 0, done = 0;
+  (void)info.Open_Buffer_Init(source.size, 0);
+  for (int jumps = 0; done < kReadMaxBytes && jumps < kJumpsMax;) {
+    const size_t got = file.ReadAt(at, piece.data(), piece.size());
+    if (got == 0) break;
+    at += got;
+    done += got;
+    const size_t status = info.Open_Buffer_Continue(reinterpret_cast<const unsigned char*>(piece.data()), got);
+    if ((status & kFinished) != 0) break;
+    const uint64_t wanted = info.Open_Buffer_Continue_GoTo_Get();
+    if (wanted == UINT64_MAX) continue;
+    at = wanted;
+    ++jumps;
+    (void)info.Open_Buffer_Init(source.size, at);
+  }
+  (void)info.Open_Buffer_Finalize();
+}
+
+void ReadStreams(const Source& source, Findings& findings) {
+  MediaInfo info;
+  Feed(info, source);
+  if (Value(info, MediaInfoLib::Stream_General, 0, L"Format").empty()) return findings.Fail("damaged");
+  for (const Row& row : kRows) SetRow(row, Value(info, row.stream, 0, row.name), findings);
+  AddStreams(info, findings);
+}
+
+}  // namespace
+
+void PrepareVideo() { (void)MediaInfo::Option_Static(L"ReadByHuman", L"0"); }
+
+void ReadVideo(const Source& source, Findings& findings) {
+  try {
+    ReadStreams(source, findings);
+  } catch (const std::bad_alloc&) {
+    findings.Fail("needs too much memory");
+  } catch (const std::exception&) {
+    findings.Fail("damaged");
+  }
+}
+
+}  // namespace ferrox::extract
