@@ -46,7 +46,7 @@ bool NaturalLess(const std::string& a, const std::string& b) {
   size_t i = 0, k = 0;
   while (i < a.size() && k < b.size()) {
     if (!IsDigit(a[i]) || !IsDigit(b[k])) {
-      if (a[i] != b[k]) return a[i] < b[k];
+      if (a[i] != b[k]) return static_cast<unsigned char>(a[i]) < static_cast<unsigned char>(b[k]);
       ++i, ++k;
       continue;
     }

@@ -1,0 +1,147 @@
+#include "services/kovacontentextractd/readers/archive_names.h"
+
+#include <archive.h>
+#include <archive_entry.h>
+
+#include <algorithm>
+#include <memory>
+#include <vector>
+
+#include "services/kovacontentextractd/readers/byte_source.h"
+#include "services/kovacontentextractd/readers/zip_container.h"
+
+namespace ferrox::extract {
+
+namespace {
+
+constexpr size_t kPieceBytes = 64U << 10;
+/// Of a packed archive, all must be unpacked to find the names in it: no more than takes a few seconds.
+constexpr int64_t kUnpackedMaxBytes = 1LL << 30;
+constexpr int kNamesMax = 200000;
+
+struct Free {
+  void operator()(archive* reader) const { (void)archive_read_free(reader); }
+};
+
+/// What the library reads from.
+struct Input {
+  explicit Input(const Source& source) : file(source), piece(kPieceBytes) {}
+  FileBytes file;
+  uint64_t at = 0;
+  std::vector<char> piece;
+};
+
+la_ssize_t OnRead(archive*, void* data, const void** buffer) {
+  auto& input = *static_cast<Input*>(data);
+  const size_t got = input.file.ReadAt(input.at, input.piece.data(), input.piece.size());
+  input.at += got;
+  *buffer = input.piece.data();
+  return static_cast<la_ssize_t>(got);
+}
+
+la_int64_t OnSkip(archive*, void* data, la_int64_t count) {
+  auto& input = *static_cast<Input*>(data);
+  const uint64_t left = input.file.Size() - std::min(input.at, input.file.Size());
+  const uint64_t skipped = std::min(left, static_cast<uint64_t>(std::max<la_int64_t>(count, 0)));
+  input.at += skipped;
+  return static_cast<la_int64_t>(skipped);
+}
+
+la_int64_t OnSeek(archive*, void* data, la_int64_t offset, int whence) {
+  auto& input = *static_cast<Input*>(data);
+  const auto size = static_cast<la_int64_t>(input.file.Size());
+  const la_int64_t base = whence == SEEK_CUR ? static_cast<la_int64_t>(input.at) : whence == SEEK_END ? size : 0;
+  if (offset < -base || offset > size - base) return ARCHIVE_FATAL;
+  input.at = static_cast<uint64_t>(base + offset);
+  return static_cast<la_int64_t>(input.at);
+}
+
+std::unique_ptr<archive, Free> Open(Input& input) {
+  std::unique_ptr<archive, Free> reader(archive_read_new());
+  archive* const raw = reader.get();
+  // One by one: the library's "all" has packings that it starts programs for.
+  for (const auto support :
+       {&archive_read_support_filter_gzip, &archive_read_support_filter_bzip2, &archive_read_support_filter_xz,
+        &archive_read_support_filter_lzma, &archive_read_support_filter_zstd, &archive_read_support_filter_compress,
+        &archive_read_support_format_tar, &archive_read_support_format_7zip, &archive_read_support_format_rar,
+        &archive_read_support_format_rar5, &archive_read_support_format_cpio}) {
+    (void)support(raw);
+  }
+  (void)archive_read_set_callback_data(raw, &input);
+  (void)archive_read_set_read_callback(raw, &OnRead);
+  (void)archive_read_set_skip_callback(raw, &OnSkip);
+  (void)archive_read_set_seek_callback(raw, &OnSeek);
+  if (archive_read_open1(raw) != ARCHIVE_OK) reader.reset();
+  return reader;
+}
+
+/// Whether what was unpacked so far is within the limits.
+bool Fits(archive* reader, Findings& findings) {
+  const Limits& limits = findings.Bounds();
+  const auto packed = static_cast<uint64_t>(std::max<int64_t>(0, archive_filter_bytes(reader, -1)));
+  const auto unpacked = static_cast<uint64_t>(std::max<int64_t>(0, archive_filter_bytes(reader, 0)));
+  if (unpacked > std::max(limits.expansion_free, limits.expansion_ratio * packed)) {
+    findings.Fail("expands to too much");
+    return false;
+  }
+  if (unpacked > kUnpackedMaxBytes) findings.Fail("too large");
+  return unpacked <= kUnpackedMaxBytes;
+}
+
+/// Passes a member. In a packed archive that means unpacking it, bit by bit so that the limits are kept.
+bool SkipMember(archive* reader, Findings& findings) {
+  if (archive_filter_count(reader) <= 1) return archive_read_data_skip(reader) >= ARCHIVE_WARN;
+  const void* block;
+  size_t size;
+  la_int64_t offset;
+  int result;
+  while ((result = archive_read_data_block(reader, &block, &size, &offset)) == ARCHIVE_OK) {
+    if (!Fits(reader, findings)) return false;
+  }
+  return result == ARCHIVE_EOF;
+}
+
+bool AddName(std::string_view name, Findings& findings) {
+  const bool more = findings.AddText(name);
+  findings.Break();
+  return more;
+}
+
+const char* NameOf(archive_entry* entry) {
+  const char* name = archive_entry_pathname_utf8(entry);
+  return name != nullptr ? name : archive_entry_pathname(entry);
+}
+
+void AddNames(archive* reader, Findings& findings) {
+  for (int count = 0; count < kNamesMax; ++count) {
+    archive_entry* entry = nullptr;
+    const int result = archive_read_next_header(reader, &entry);
+    if (result == ARCHIVE_EOF) return;
+    if (result < ARCHIVE_WARN) {
+      // A single packed file is no archive, and not damaged.
+      if (count > 0 || archive_filter_count(reader) <= 1) findings.Fail("damaged");
+      return;
+    }
+    const char* name = NameOf(entry);
+    if (name != nullptr && !AddName(name, findings)) return;
+    if (!SkipMember(reader, findings)) return findings.Fail("damaged");
+  }
+}
+
+}  // namespace
+
+void ReadArchiveNames(const Source& source, Findings& findings) {
+  if (FileBytes(source).ReadAt(0, 2) == "PK") {
+    const ZipContainer zip(source, findings);
+    for (const std::string& name : zip.Names("", "", kNamesMax)) {
+      if (!AddName(name, findings)) return;
+    }
+    return;
+  }
+  Input input(source);
+  const std::unique_ptr<archive, Free> reader = Open(input);
+  if (reader == nullptr) return findings.Fail("damaged");
+  AddNames(reader.get(), findings);
+}
+
+}  // namespace ferrox::extract

@@ -1,0 +1,200 @@
+#include "services/kovacontentextractd/readers/mail.h"
+
+#include <unistd.h>
+
+#include <algorithm>
+#include <gmime/gmime.h>
+#include <memory>
+#include <string>
+
+#include "platform/host/content/encoding.h"
+#include "platform/host/content/markup.h"
+#include "services/kovacontentextractd/readers/byte_source.h"
+
+namespace ferrox::extract {
+
+namespace {
+
+constexpr int kMessagesMax = 20000;
+constexpr int kPartsMax = 1000;
+constexpr int kLevelsMax = 16;
+constexpr int kAddressesMax = 500;
+constexpr size_t kPartMaxBytes = 2U << 20;
+
+struct Unref {
+  void operator()(void* object) const { g_object_unref(object); }
+};
+template <typename Type>
+using Ref = std::unique_ptr<Type, Unref>;
+
+std::string_view View(const char* text) { return text != nullptr ? text : std::string_view(); }
+
+/// Reads one message after the other out of a file.
+class MailReader {
+ public:
+  MailReader(const Source& source, Findings& findings)
+      : findings_(findings), is_box_(FileBytes(source).ReadAt(0, 5) == "From "), depth_(source.depth) {}
+
+  void Read(int fd) {
+    const Ref<GMimeStream> stream(g_mime_stream_fs_new(fd));
+    const Ref<GMimeParser> parser(g_mime_parser_new_with_stream(stream.get()));
+    g_mime_parser_set_format(parser.get(), is_box_ ? GMIME_FORMAT_MBOX : GMIME_FORMAT_MESSAGE);
+    for (int count = 0; count < kMessagesMax; ++count) {
+      const Ref<GMimeMessage> message(g_mime_parser_construct_message(parser.get(), nullptr));
+      if (message == nullptr) {
+        if (count == 0) findings_.Fail("damaged");
+        return;
+      }
+      AddHeader(message.get());
+      parts_ = 0;
+      if (!AddMessageText(message.get(), 0) || !is_box_ || g_mime_parser_eos(parser.get()) != FALSE) return;
+    }
+  }
+
+ private:
+  void AddHeader(GMimeMessage* message) {
+    AddPeople(message, GMIME_ADDRESS_TYPE_FROM, "KOVAMDAuthors", "KOVAMDAuthorAddresses");
+    AddPeople(message, GMIME_ADDRESS_TYPE_TO, "KOVAMDRecipients", "KOVAMDRecipientAddresses");
+    AddPeople(message, GMIME_ADDRESS_TYPE_CC, "KOVAMDRecipients", "KOVAMDRecipientAddresses");
+    if (is_box_) return;  // what is one message's
+    findings_.Set("KOVAMDTitle", View(g_mime_message_get_subject(message)));
+    findings_.Set("KOVAMDIdentifier", View(g_mime_message_get_message_id(message)));
+    GMimeObject* headers = GMIME_OBJECT(message);
+    findings_.Set("KOVAMDEncodingApplications", View(g_mime_object_get_header(headers, "User-Agent")));
+    findings_.Set("KOVAMDEncodingApplications", View(g_mime_object_get_header(headers, "X-Mailer")));
+    findings_.Set("KOVAMDKeywords", View(g_mime_object_get_header(headers, "Keywords")));
+    GDateTime* date = g_mime_message_get_date(message);
+    if (date != nullptr) findings_.SetInteger("KOVAMDContentCreationDate", g_date_time_to_unix(date));
+  }
+
+  void AddPeople(GMimeMessage* message, GMimeAddressType type, const char* names, const char* addresses) {
+    AddAddresses(g_mime_message_get_addresses(message, type), names, addresses, 0);
+  }
+
+  void AddAddresses(InternetAddressList* list, const char* names, const char* addresses, int level) {
+    const int count = list != nullptr && level < 3 ? std::min(internet_address_list_length(list), kAddressesMax) : 0;
+    for (int i = 0; i < count; ++i) {
+      InternetAddress* address = internet_address_list_get_address(list, i);
+      const std::string_view name = View(internet_address_get_name(address));
+      if (INTERNET_ADDRESS_IS_GROUP(address)) {
+        InternetAddressList* members = internet_address_group_get_members(INTERNET_ADDRESS_GROUP(address));
+        AddAddresses(members, names, addresses, level + 1);
+      } else if (INTERNET_ADDRESS_IS_MAILBOX(address)) {
+        const std::string_view mailbox = View(internet_address_mailbox_get_addr(INTERNET_ADDRESS_MAILBOX(address)));
+        findings_.Append(names, name.empty() ? mailbox : name);
+        findings_.Append(addresses, mailbox);
+      }
+    }
+  }
+
+  /// False when the findings take no more.
+  bool AddMessageText(GMimeMessage* message, int level) {
+    if (is_box_ || level > 0) AddLine(View(g_mime_message_get_subject(message)));
+    return AddObject(g_mime_message_get_mime_part(message), level);
+  }
+
+  bool AddObject(GMimeObject* object, int level) {
+    if (object == nullptr || level > kLevelsMax || ++parts_ > kPartsMax) return true;
+    if (GMIME_IS_MULTIPART(object)) return AddMultipart(GMIME_MULTIPART(object), level);
+    if (GMIME_IS_MESSAGE_PART(object)) {
+      return AddInnerMessage(g_mime_message_part_get_message(GMIME_MESSAGE_PART(object)), level);
+    }
+    return !GMIME_IS_PART(object) || AddPart(GMIME_PART(object));
+  }
+
+  /// A message within a message is a file in a file.
+  bool AddInnerMessage(GMimeMessage* message, int level) {
+    if (message == nullptr || depth_ == findings_.Bounds().nesting) return true;
+    ++depth_;
+    const bool more = AddMessageText(message, level + 1);
+    --depth_;
+    return more;
+  }
+
+  bool AddMultipart(GMimeMultipart* multipart, int level) {
+    GMimeContentType* type = g_mime_object_get_content_type(GMIME_OBJECT(multipart));
+    const int count = std::min(g_mime_multipart_get_count(multipart), kPartsMax);
+    if (g_mime_content_type_is_type(type, "multipart", "alternative") != FALSE && count > 0) {
+      return AddObject(BestAlternative(multipart, count), level + 1);
+    }
+    for (int i = 0; i < count; ++i) {
+      if (!AddObject(g_mime_multipart_get_part(multipart, i), level + 1)) return false;
+    }
+    return true;
+  }
+
+  /// Of the same text in several forms, the plain one; else the last, which is the richest.
+  static GMimeObject* BestAlternative(GMimeMultipart* multipart, int count) {
+    for (int i = 0; i < count; ++i) {
+      GMimeObject* part = g_mime_multipart_get_part(multipart, i);
+      GMimeContentType* type = g_mime_object_get_content_type(part);
+      if (g_mime_content_type_is_type(type, "text", "plain") != FALSE) return part;
+    }
+    return g_mime_multipart_get_part(multipart, count - 1);
+  }
+
+  bool AddPart(GMimePart* part) {
+    const std::string_view name = View(g_mime_part_get_filename(part));
+    AddLine(name);
+    GMimeContentType* type = g_mime_object_get_content_type(GMIME_OBJECT(part));
+    if (g_mime_content_type_is_type(type, "text", "*") == FALSE) return true;
+    const std::string bytes = Unpacked(part);
+    const char* charset = g_mime_object_get_content_type_parameter(GMIME_OBJECT(part), "charset");
+    kova::content::DecodedText decoded;
+    const bool cut = bytes.size() == kPartMaxBytes;
+    if (!kova::content::Decode(bytes, cut, std::string(View(charset)), decoded)) return true;
+    if (g_mime_content_type_is_type(type, "text", "html") != FALSE) {
+      decoded.text = kova::content::ReadHtml(decoded.text, findings_.Bounds().text_bytes).text;
+    }
+    const bool more = findings_.AddText(decoded.text);
+    findings_.Break();
+    return more;
+  }
+
+  /// The part's content without its transfer encoding.
+  static std::string Unpacked(GMimePart* part) {
+    GMimeDataWrapper* content = g_mime_part_get_content(part);
+    GMimeStream* packed = content != nullptr ? g_mime_data_wrapper_get_stream(content) : nullptr;
+    if (packed == nullptr) return {};
+    (void)g_mime_stream_reset(packed);
+    const Ref<GMimeStream> stream(g_mime_stream_filter_new(packed));
+    const Ref<GMimeFilter> filter(g_mime_filter_basic_new(g_mime_data_wrapper_get_encoding(content), FALSE));
+    (void)g_mime_stream_filter_add(GMIME_STREAM_FILTER(stream.get()), filter.get());
+    std::string bytes(kPartMaxBytes, '\0');
+    size_t have = 0;
+    while (have < bytes.size()) {
+      const ssize_t got = g_mime_stream_read(stream.get(), bytes.data() + have, bytes.size() - have);
+      if (got <= 0) break;
+      have += static_cast<size_t>(got);
+    }
+    bytes.resize(have);
+    return bytes;
+  }
+
+  void AddLine(std::string_view text) {
+    if (text.empty()) return;
+    (void)findings_.AddText(text);
+    findings_.Break();
+  }
+
+  Findings& findings_;
+  bool is_box_;
+  int depth_;
+  int parts_ = 0;
+};
+
+}  // namespace
+
+void PrepareMail() { g_mime_init(); }
+
+void ReadMail(const Source& source, Findings& findings) {
+  PrepareMail();
+  const int fd = dup(source.fd);  // the library closes it
+  if (fd < 0 || lseek(fd, 0, SEEK_SET) != 0) {
+    if (fd >= 0) (void)close(fd);
+    return findings.Fail("damaged");
+  }
+  MailReader(source, findings).Read(fd);
+}
+
+}  // namespace ferrox::extract
