@@ -1,12 +1,14 @@
-#include "services/kovacontentextractd/readers/archive_names.h"
+#include "services/kovacontentextractd/readers/archive.h"
 
 #include <archive.h>
 #include <archive_entry.h>
+#include <locale.h>
 
 #include <algorithm>
 #include <memory>
 #include <vector>
 
+#include "platform/host/content/encoding.h"
 #include "services/kovacontentextractd/readers/byte_source.h"
 #include "services/kovacontentextractd/readers/zip_container.h"
 
@@ -64,7 +66,7 @@ std::unique_ptr<archive, Free> Open(Input& input) {
        {&archive_read_support_filter_gzip, &archive_read_support_filter_bzip2, &archive_read_support_filter_xz,
         &archive_read_support_filter_lzma, &archive_read_support_filter_zstd, &archive_read_support_filter_compress,
         &archive_read_support_format_tar, &archive_read_support_format_7zip, &archive_read_support_format_rar,
-        &archive_read_support_format_rar5, &archive_read_support_format_cpio}) {
+        &archive_read_support_format_rar5, &archive_read_support_format_cpio, &archive_read_support_format_raw}) {
     (void)support(raw);
   }
   (void)archive_read_set_callback_data(raw, &input);
@@ -88,17 +90,24 @@ bool Fits(archive* reader, Findings& findings) {
   return unpacked <= kUnpackedMaxBytes;
 }
 
-/// Passes a member. In a packed archive that means unpacking it, bit by bit so that the limits are kept.
-bool SkipMember(archive* reader, Findings& findings) {
-  if (archive_filter_count(reader) <= 1) return archive_read_data_skip(reader) >= ARCHIVE_WARN;
+/// Unpacks until `take` wants no more. False at damage, and when the limits are reached.
+template <typename Take>
+bool Unpack(archive* reader, Findings& findings, Take take) {
   const void* block;
   size_t size;
   la_int64_t offset;
   int result;
   while ((result = archive_read_data_block(reader, &block, &size, &offset)) == ARCHIVE_OK) {
     if (!Fits(reader, findings)) return false;
+    if (!take(std::string_view(static_cast<const char*>(block), size))) return true;
   }
   return result == ARCHIVE_EOF;
+}
+
+/// Passes a member. In a packed archive that means unpacking it, bit by bit so that the limits are kept.
+bool SkipMember(archive* reader, Findings& findings) {
+  if (archive_filter_count(reader) <= 1) return archive_read_data_skip(reader) >= ARCHIVE_WARN;
+  return Unpack(reader, findings, [](std::string_view) { return true; });
 }
 
 bool AddName(std::string_view name, Findings& findings) {
@@ -107,9 +116,40 @@ bool AddName(std::string_view name, Findings& findings) {
   return more;
 }
 
+/// The library turns names into the encoding of the locale, and drops those that it does not have.
+locale_t Utf8Locale() {
+  static const locale_t locale = newlocale(LC_CTYPE_MASK, "C.UTF-8", nullptr);
+  return locale;
+}
+
+class Utf8Names {
+ public:
+  Utf8Names() : before_(uselocale(Utf8Locale())) {}
+  ~Utf8Names() { (void)uselocale(before_); }
+  Utf8Names(const Utf8Names&) = delete;
+  Utf8Names& operator=(const Utf8Names&) = delete;
+
+ private:
+  locale_t before_;
+};
+
 const char* NameOf(archive_entry* entry) {
   const char* name = archive_entry_pathname_utf8(entry);
   return name != nullptr ? name : archive_entry_pathname(entry);
+}
+
+/// What is no archive may be one packed file.
+void AddPackedFile(archive* reader, Findings& findings) {
+  if (archive_filter_count(reader) <= 1) return findings.Fail("damaged");
+  std::string bytes;
+  const size_t limit = 2 * findings.Bounds().text_bytes;
+  const bool good = Unpack(reader, findings, [&](std::string_view piece) {
+    bytes += piece.substr(0, limit - bytes.size());
+    return bytes.size() < limit;
+  });
+  if (!good) findings.Fail("damaged");
+  kova::content::DecodedText decoded;
+  if (kova::content::Decode(bytes, bytes.size() == limit, {}, decoded)) (void)findings.AddText(decoded.text);
 }
 
 void AddNames(archive* reader, Findings& findings) {
@@ -117,11 +157,8 @@ void AddNames(archive* reader, Findings& findings) {
     archive_entry* entry = nullptr;
     const int result = archive_read_next_header(reader, &entry);
     if (result == ARCHIVE_EOF) return;
-    if (result < ARCHIVE_WARN) {
-      // A single packed file is no archive, and not damaged.
-      if (count > 0 || archive_filter_count(reader) <= 1) findings.Fail("damaged");
-      return;
-    }
+    if (result < ARCHIVE_WARN) return findings.Fail("damaged");
+    if (archive_format(reader) == ARCHIVE_FORMAT_RAW) return AddPackedFile(reader, findings);
     const char* name = NameOf(entry);
     if (name != nullptr && !AddName(name, findings)) return;
     if (!SkipMember(reader, findings)) return findings.Fail("damaged");
@@ -130,7 +167,9 @@ void AddNames(archive* reader, Findings& findings) {
 
 }  // namespace
 
-void ReadArchiveNames(const Source& source, Findings& findings) {
+void PrepareArchive() { (void)Utf8Locale(); }
+
+void ReadArchive(const Source& source, Findings& findings) {
   if (FileBytes(source).ReadAt(0, 2) == "PK") {
     const ZipContainer zip(source, findings);
     for (const std::string& name : zip.Names("", "", kNamesMax)) {
@@ -138,6 +177,7 @@ void ReadArchiveNames(const Source& source, Findings& findings) {
     }
     return;
   }
+  const Utf8Names scope;
   Input input(source);
   const std::unique_ptr<archive, Free> reader = Open(input);
   if (reader == nullptr) return findings.Fail("damaged");
