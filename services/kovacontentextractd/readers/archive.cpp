@@ -8,8 +8,8 @@
 #include <memory>
 #include <vector>
 
-#include "platform/host/content/encoding.h"
 #include "services/kovacontentextractd/readers/byte_source.h"
+#include "services/kovacontentextractd/readers/encoding.h"
 #include "services/kovacontentextractd/readers/zip_container.h"
 
 namespace ferrox::extract {
@@ -148,8 +148,8 @@ void AddPackedFile(archive* reader, Findings& findings) {
     return bytes.size() < limit;
   });
   if (!good) findings.Fail("damaged");
-  kova::content::DecodedText decoded;
-  if (kova::content::Decode(bytes, bytes.size() == limit, {}, decoded)) (void)findings.AddText(decoded.text);
+  DecodedText decoded;
+  if (Decode(bytes, bytes.size() == limit, {}, decoded)) (void)findings.AddText(decoded.text);
 }
 
 void AddNames(archive* reader, Findings& findings) {

@@ -5,7 +5,7 @@
 #include <string>
 #include <vector>
 
-#include "platform/host/content/markup.h"
+#include "services/kovacontentextractd/readers/markup.h"
 #include "services/kovacontentextractd/readers/property_fields.h"
 #include "services/kovacontentextractd/readers/xml_tokenizer.h"
 #include "services/kovacontentextractd/readers/zip_container.h"
@@ -89,7 +89,7 @@ void ReadElectronicBook(const Source& source, Findings& findings) {
   if (package == nullptr) return;
   for (const std::string& chapter : Chapters(*package, folder)) {
     const std::string html = zip.ReadMember(chapter, kChapterMaxBytes);
-    if (!findings.AddText(kova::content::ReadHtml(html, findings.Bounds().text_bytes).text)) return;
+    if (!findings.AddText(ReadHtml(html, findings.Bounds().text_bytes).text)) return;
     findings.Break();
   }
 }

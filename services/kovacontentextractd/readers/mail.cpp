@@ -7,9 +7,9 @@
 #include <memory>
 #include <string>
 
-#include "platform/host/content/encoding.h"
-#include "platform/host/content/markup.h"
 #include "services/kovacontentextractd/readers/byte_source.h"
+#include "services/kovacontentextractd/readers/encoding.h"
+#include "services/kovacontentextractd/readers/markup.h"
 
 namespace ferrox::extract {
 
@@ -140,11 +140,11 @@ class MailReader {
     if (g_mime_content_type_is_type(type, "text", "*") == FALSE) return true;
     const std::string bytes = Unpacked(part);
     const char* charset = g_mime_object_get_content_type_parameter(GMIME_OBJECT(part), "charset");
-    kova::content::DecodedText decoded;
+    DecodedText decoded;
     const bool cut = bytes.size() == kPartMaxBytes;
-    if (!kova::content::Decode(bytes, cut, std::string(View(charset)), decoded)) return true;
+    if (!Decode(bytes, cut, std::string(View(charset)), decoded)) return true;
     if (g_mime_content_type_is_type(type, "text", "html") != FALSE) {
-      decoded.text = kova::content::ReadHtml(decoded.text, findings_.Bounds().text_bytes).text;
+      decoded.text = ReadHtml(decoded.text, findings_.Bounds().text_bytes).text;
     }
     const bool more = findings_.AddText(decoded.text);
     findings_.Break();
