@@ -1,12 +1,10 @@
 #include <algorithm>
-#include <array>
 #include <charconv>
-#include <cmath>
-#include <cstdio>
 #include <memory>
+#include <set>
 
+#include "services/kovacontentextractd/readers/cell_numbers.h"
 #include "services/kovacontentextractd/readers/office_package.h"
-#include "services/kovacontentextractd/readers/times.h"
 
 namespace ferrox::extract {
 
@@ -35,21 +33,6 @@ bool ForEachToken(ZipContainer& zip, const std::string& part, Each each) {
   return true;
 }
 
-/// Whether a number in this format is shown as a date or a time.
-bool IsDateFormat(std::string_view format) {
-  bool quoted = false, bracketed = false;
-  for (size_t i = 0; i < format.size(); ++i) {
-    const char c = format[i];
-    if (c == '"') quoted = !quoted;
-    if (c == '\\' || c == '_' || c == '*') ++i;
-    if (c == '[' || c == ']') bracketed = c == '[';
-    if (!quoted && !bracketed && std::string_view("yYdDhHsS").find(c) != std::string_view::npos) return true;
-  }
-  return false;
-}
-
-bool IsBuiltInDateFormat(int id) { return (id >= 14 && id <= 22) || (id >= 27 && id <= 36) || (id >= 45 && id <= 58); }
-
 int ToInt(std::string_view text) {
   int value = 0;
   (void)std::from_chars(text.data(), text.data() + text.size(), value);
@@ -57,7 +40,7 @@ int ToInt(std::string_view text) {
 }
 
 void ReadStyles(ZipContainer& zip, const std::string& part, Workbook& workbook) {
-  std::vector<int> date_formats;
+  std::set<int> date_formats;
   bool in_cell_styles = false;
   (void)ForEachToken(zip, part, [&](XmlTokenizer& xml, Token token) {
     if (token == Token::kText) return true;
@@ -65,11 +48,10 @@ void ReadStyles(ZipContainer& zip, const std::string& part, Workbook& workbook) 
       in_cell_styles = token == Token::kOpen;
     } else if (token == Token::kOpen && xml.Name() == "numFmt") {
       const bool is_date = IsDateFormat(xml.Attribute("formatCode"));
-      if (is_date && date_formats.size() < kStylesMax) date_formats.push_back(ToInt(xml.Attribute("numFmtId")));
+      if (is_date && date_formats.size() < kStylesMax) date_formats.insert(ToInt(xml.Attribute("numFmtId")));
     } else if (token == Token::kOpen && in_cell_styles && xml.Name() == "xf") {
       const int id = ToInt(xml.Attribute("numFmtId"));
-      const bool own = std::find(date_formats.begin(), date_formats.end(), id) != date_formats.end();
-      workbook.style_is_date.push_back(own || IsBuiltInDateFormat(id));
+      workbook.style_is_date.push_back(date_formats.contains(id) || IsBuiltInDateFormat(id));
     }
     return workbook.style_is_date.size() < kStylesMax;
   });
@@ -102,33 +84,12 @@ bool AddSharedTexts(ZipContainer& zip, const std::string& part, Findings& findin
   });
 }
 
-std::string DateText(double days, bool from_1904) {
-  constexpr double kEpochDays = 25569, kDays1904 = 1462, kDaysMax = 2958466;
-  const double since_1900 = days + (from_1904 ? kDays1904 : 0);
-  if (!(since_1900 >= 0 && since_1900 < kDaysMax)) return {};
-  const CivilTime time = FromSeconds(std::llround((since_1900 - kEpochDays) * 86400));
-  std::array<char, 64> text;
-  const bool has_time = days != std::floor(days), has_date = days >= 1;
-  int size = 0;
-  if (has_date) {
-    size = snprintf(text.data(), text.size(), "%04d-%02d-%02d%s", static_cast<int>(time.year), time.month, time.day,
-                    has_time ? " " : "");
-  }
-  if (has_time) {
-    size += snprintf(text.data() + size, text.size() - static_cast<size_t>(size), "%02d:%02d", time.hour, time.minute);
-  }
-  return {text.data(), static_cast<size_t>(size)};
-}
-
-/// A number as a sheet shows it, as far as that takes no knowledge of its format.
-std::string NumberText(const std::string& stored, bool is_date, bool from_1904) {
+/// What is no number stands as it is.
+std::string StoredNumberText(const std::string& stored, bool is_date, bool from_1904) {
   double value = 0;
   const char* end = stored.data() + stored.size();
   if (std::from_chars(stored.data(), end, value).ptr != end) return stored;
-  if (is_date) return DateText(value, from_1904);
-  std::array<char, 64> text;
-  const auto written = std::to_chars(text.data(), text.data() + text.size(), value, std::chars_format::general, 15);
-  return {text.data(), written.ptr};
+  return NumberText(value, is_date, from_1904);
 }
 
 /// Adds the texts and numbers of the cells of one sheet that do not point into the table of shared texts.
@@ -165,7 +126,7 @@ class SheetReader {
     const bool is_number = type_.empty() || type_ == "n";
     if (value_.empty() || (!is_number && type_ != "str" && type_ != "inlineStr" && type_ != "d")) return true;
     const bool is_date = style_ < workbook_.style_is_date.size() && workbook_.style_is_date[style_];
-    const std::string text = is_number ? NumberText(value_, is_date, workbook_.from_1904) : value_;
+    const std::string text = is_number ? StoredNumberText(value_, is_date, workbook_.from_1904) : value_;
     return findings_.AddText(text) && findings_.AddText("\t");
   }
 

@@ -1,0 +1,147 @@
+#include "services/kovacontentextractd/readers/compound_file.h"
+
+#include <algorithm>
+
+#include "services/kovacontentextractd/readers/code_pages.h"
+#include "services/kovacontentextractd/readers/little_endian.h"
+
+namespace ferrox::extract {
+
+namespace {
+
+constexpr std::string_view kMark = "\xD0\xCF\x11\xE0\xA1\xB1\x1A\xE1";
+constexpr size_t kHeaderBytes = 512;
+constexpr uint32_t kLastSector = 0xFFFFFFFA;  ///< numbers beyond it have other meanings: end, free
+constexpr size_t kEntryBytes = 128;
+constexpr size_t kEntriesMax = 65536;
+constexpr uint64_t kTableMax = 8U << 20;  ///< sectors: a file of 4 GiB
+
+}  // namespace
+
+size_t CompoundStream::ReadAt(uint64_t offset, char* buffer, size_t room) const {
+  const uint32_t shift = mini_ ? file_->mini_shift_ : file_->sector_shift_;
+  const uint64_t sector_bytes = uint64_t{1} << shift;
+  size_t have = 0;
+  while (have < room && offset < size_ && (offset >> shift) < sectors_.size()) {
+    const uint32_t sector = sectors_[static_cast<size_t>(offset >> shift)];
+    const uint64_t within = offset & (sector_bytes - 1);
+    const auto wanted = static_cast<size_t>(std::min<uint64_t>({room - have, sector_bytes - within, size_ - offset}));
+    const size_t got = mini_ ? file_->mini_stream_.ReadAt((uint64_t{sector} << shift) + within, buffer + have, wanted)
+                             : file_->file_.ReadAt(file_->SectorOffset(sector) + within, buffer + have, wanted);
+    have += got;
+    offset += got;
+    if (got < wanted) break;
+  }
+  return have;
+}
+
+std::string CompoundStream::ReadAt(uint64_t offset, size_t size) const {
+  if (offset >= size_) return {};
+  std::string bytes(static_cast<size_t>(std::min<uint64_t>(size, size_ - offset)), '\0');
+  bytes.resize(ReadAt(offset, bytes.data(), bytes.size()));
+  return bytes;
+}
+
+size_t CompoundStream::Read(char* buffer, size_t room) {
+  const size_t got = ReadAt(at_, buffer, room);
+  at_ += got;
+  return got;
+}
+
+CompoundFile::CompoundFile(const Source& source) : file_(source) {
+  const std::string header = file_.ReadAt(0, kHeaderBytes);
+  sector_shift_ = Little16(header, 0x1E);
+  mini_shift_ = Little16(header, 0x20);
+  const bool sane = header.size() == kHeaderBytes && header.starts_with(kMark) && sector_shift_ >= 7 &&
+                    sector_shift_ <= 16 && mini_shift_ >= 4 && mini_shift_ <= sector_shift_;
+  if (!sane) return;
+  mini_cutoff_ = Little32(header, 0x38);
+  sectors_max_ = std::min(kTableMax, (file_.Size() >> sector_shift_) + 1);
+  ReadSectorTable(header);
+  ReadMiniTable(Little32(header, 0x3C));
+  ReadEntries(Little32(header, 0x30));
+  open_ = !entries_.empty();
+}
+
+std::string CompoundFile::ReadSector(uint32_t sector) const {
+  return file_.ReadAt(SectorOffset(sector), size_t{1} << sector_shift_);
+}
+
+void CompoundFile::AppendTable(uint32_t sector, std::vector<uint32_t>& table) const {
+  const std::string bytes = ReadSector(sector);
+  for (size_t at = 0; at + 4 <= bytes.size() && table.size() < sectors_max_; at += 4) {
+    table.push_back(Little32(bytes, at));
+  }
+}
+
+/// The table's own sectors are listed in the header, and where that has no room, in a chain of further lists.
+void CompoundFile::ReadSectorTable(const std::string& header) {
+  const auto append = [this](std::string_view list) {
+    for (size_t at = 0; at + 4 <= list.size() && table_.size() < sectors_max_; at += 4) {
+      const uint32_t sector = Little32(list, at);
+      if (sector < kLastSector) AppendTable(sector, table_);
+    }
+  };
+  append(std::string_view(header).substr(0x4C));
+  uint32_t next = Little32(header, 0x44);
+  for (uint64_t lists = 0; next < kLastSector && lists < sectors_max_ && table_.size() < sectors_max_; ++lists) {
+    const std::string list = ReadSector(next);
+    if (list.size() < 8) return;
+    append(std::string_view(list).substr(0, list.size() - 4));
+    next = Little32(list, list.size() - 4);
+  }
+}
+
+std::vector<uint32_t> CompoundFile::Chain(const std::vector<uint32_t>& table, uint32_t first) const {
+  std::vector<uint32_t> sectors;
+  for (uint32_t sector = first; sector < table.size() && sectors.size() < table.size(); sector = table[sector]) {
+    sectors.push_back(sector);
+  }
+  return sectors;
+}
+
+void CompoundFile::ReadMiniTable(uint32_t first) {
+  const uint64_t room = sectors_max_ << (sector_shift_ - mini_shift_);
+  for (const uint32_t sector : Chain(table_, first)) {
+    const std::string bytes = ReadSector(sector);
+    for (size_t at = 0; at + 4 <= bytes.size() && mini_table_.size() < std::min(room, kTableMax); at += 4) {
+      mini_table_.push_back(Little32(bytes, at));
+    }
+  }
+}
+
+void CompoundFile::ReadEntries(uint32_t first) {
+  constexpr uint8_t kRoot = 5, kStream = 2;
+  for (const uint32_t sector : Chain(table_, first)) {
+    const std::string bytes = ReadSector(sector);
+    for (size_t at = 0; at + kEntryBytes <= bytes.size(); at += kEntryBytes) {
+      const std::string_view entry = std::string_view(bytes).substr(at, kEntryBytes);
+      const size_t name_bytes = std::min<size_t>(Little16(entry, 64), 64);
+      const std::string name = FromUtf16Little(entry.substr(0, name_bytes < 2 ? 0 : name_bytes - 2));
+      const uint32_t start = Little32(entry, 116);
+      const uint64_t size = Little32(entry, 120);  // bigger ones are not office files
+      const auto type = static_cast<uint8_t>(entry[66]);
+      if (type == kRoot && mini_stream_.file_ == nullptr) {
+        mini_stream_.file_ = this;
+        mini_stream_.sectors_ = Chain(table_, start);
+        mini_stream_.size_ = std::min<uint64_t>(size, uint64_t{mini_stream_.sectors_.size()} << sector_shift_);
+      } else if (type == kStream && entries_.size() < kEntriesMax) {
+        entries_.push_back({name, start, size});
+      }
+    }
+  }
+}
+
+std::unique_ptr<CompoundStream> CompoundFile::Open(std::string_view name) const {
+  const auto found = std::find_if(entries_.begin(), entries_.end(), [&](const Entry& e) { return e.name == name; });
+  if (found == entries_.end()) return nullptr;
+  auto stream = std::make_unique<CompoundStream>();
+  stream->file_ = this;
+  stream->mini_ = found->size < mini_cutoff_;
+  stream->sectors_ = Chain(stream->mini_ ? mini_table_ : table_, found->first_sector);
+  const uint32_t shift = stream->mini_ ? mini_shift_ : sector_shift_;
+  stream->size_ = std::min(found->size, uint64_t{stream->sectors_.size()} << shift);
+  return stream;
+}
+
+}  // namespace ferrox::extract

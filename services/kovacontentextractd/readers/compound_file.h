@@ -1,0 +1,71 @@
+#pragma once
+
+#include <memory>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "services/kovacontentextractd/readers/byte_source.h"
+
+namespace ferrox::extract {
+
+class CompoundFile;
+
+/// One stream in a compound file.
+class CompoundStream : public ByteSource {
+ public:
+  uint64_t Size() const { return size_; }
+  size_t Read(char* buffer, size_t room) override;
+  /// Passes `count` bytes, or all that are left.
+  void Skip(uint64_t count) { at_ = count < size_ - at_ ? at_ + count : size_; }
+  uint64_t Left() const { return size_ - at_; }
+  std::string ReadAt(uint64_t offset, size_t size) const;
+
+ private:
+  friend class CompoundFile;
+  size_t ReadAt(uint64_t offset, char* buffer, size_t room) const;
+
+  const CompoundFile* file_ = nullptr;
+  std::vector<uint32_t> sectors_;
+  bool mini_ = false;  ///< its sectors are small ones within the file's stream for them
+  uint64_t size_ = 0;
+  uint64_t at_ = 0;
+};
+
+/// The container of office files before they were ZIP files: a small file system. A chain of sectors that comes back on
+/// itself ends where more sectors would come than the file has.
+class CompoundFile {
+ public:
+  explicit CompoundFile(const Source& source);
+  bool IsOpen() const { return open_; }
+  /// The first stream of this name, in whatever storage; null when there is none.
+  std::unique_ptr<CompoundStream> Open(std::string_view name) const;
+
+ private:
+  friend class CompoundStream;
+  struct Entry {
+    std::string name;
+    uint32_t first_sector;
+    uint64_t size;
+  };
+
+  uint64_t SectorOffset(uint32_t sector) const { return (uint64_t{sector} + 1) << sector_shift_; }
+  std::vector<uint32_t> Chain(const std::vector<uint32_t>& table, uint32_t first) const;
+  void ReadSectorTable(const std::string& header);
+  void ReadMiniTable(uint32_t first);
+  void ReadEntries(uint32_t first);
+  void AppendTable(uint32_t sector, std::vector<uint32_t>& table) const;
+  std::string ReadSector(uint32_t sector) const;
+
+  FileBytes file_;
+  bool open_ = false;
+  uint32_t sector_shift_ = 9, mini_shift_ = 6;
+  uint64_t mini_cutoff_ = 4096;
+  uint64_t sectors_max_ = 0;          ///< as many as the file has room for
+  std::vector<uint32_t> table_;       ///< the sector behind each one
+  std::vector<uint32_t> mini_table_;  ///< the same for small sectors
+  std::vector<Entry> entries_;
+  CompoundStream mini_stream_;
+};
+
+}  // namespace ferrox::extract

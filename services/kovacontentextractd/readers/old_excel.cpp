@@ -1,0 +1,273 @@
+#include <algorithm>
+#include <bit>
+#include <set>
+#include <string>
+#include <vector>
+
+#include "services/kovacontentextractd/readers/cell_numbers.h"
+#include "services/kovacontentextractd/readers/code_pages.h"
+#include "services/kovacontentextractd/readers/little_endian.h"
+#include "services/kovacontentextractd/readers/old_office_parts.h"
+
+namespace ferrox::extract {
+
+namespace {
+
+enum RecordType : uint16_t {
+  kBof = 0x0809,
+  kFilePass = 0x002F,
+  kCodePage = 0x0042,
+  kDateMode = 0x0022,
+  kBoundSheet = 0x0085,
+  kSharedTexts = 0x00FC,
+  kContinue = 0x003C,
+  kFormat = 0x041E,
+  kExtendedFormat = 0x00E0,
+  kLabel = 0x0204,
+  kRichLabel = 0x00D6,
+  kNumber = 0x0203,
+  kShortNumber = 0x027E,
+  kShortNumbers = 0x00BD,
+  kFormula = 0x0006,
+  kFormulaText = 0x0207,
+};
+constexpr uint16_t kBiff8 = 0x0600;
+constexpr size_t kStylesMax = 65536;
+
+/// The records of a workbook, one at a time.
+class Records {
+ public:
+  explicit Records(CompoundStream& stream) : stream_(stream) {}
+
+  bool Next() {
+    std::string header(4, '\0');
+    if (stream_.Read(header.data(), 4) != 4) return false;
+    type_ = Little16(header, 0);
+    content_.resize(Little16(header, 2));
+    content_.resize(stream_.Read(content_.data(), content_.size()));
+    return true;
+  }
+  uint16_t Type() const { return type_; }
+  std::string_view Content() const { return content_; }
+
+ private:
+  CompoundStream& stream_;
+  uint16_t type_ = 0;
+  std::string content_;
+};
+
+/// The table of texts, which goes on from record to record. Where a text is cut by the end of one, the next begins with
+/// a new byte that says whether its characters have one or two bytes.
+class SharedTexts {
+ public:
+  SharedTexts(Records& records, Findings& findings) : records_(records), findings_(findings) {}
+
+  /// Leaves the first record behind the table as the current one; false when that is none, or no more text is taken.
+  bool Add() {
+    at_ = 8;
+    const uint32_t count = Little32(records_.Content(), 4);
+    for (uint32_t i = 0; i < count && in_table_; ++i) {
+      if (!AddText()) return false;
+    }
+    while (in_table_) NextRecord();
+    return !ended_;
+  }
+
+ private:
+  void NextRecord() {
+    ended_ = !records_.Next();
+    in_table_ = !ended_ && records_.Type() == kContinue;
+    at_ = 0;
+  }
+
+  /// A number that no record cuts.
+  uint32_t Number(size_t size) {
+    if (at_ >= records_.Content().size()) NextRecord();
+    if (!in_table_) return 0;
+    const auto value = static_cast<uint32_t>(LittleEndian(records_.Content(), at_, size));
+    at_ += size;
+    return value;
+  }
+
+  bool AddText() {
+    const uint32_t length = Number(2);
+    uint32_t flags = Number(1);
+    const uint32_t runs = (flags & 8) != 0 ? Number(2) : 0;
+    const uint32_t extra = (flags & 4) != 0 ? Number(4) : 0;
+    bool more = true;
+    for (uint32_t left = length; left > 0 && in_table_;) {
+      if (at_ >= records_.Content().size()) {
+        NextRecord();
+        if (!in_table_) break;
+        flags = Number(1);
+      }
+      const size_t width = (flags & 1) != 0 ? 2 : 1;
+      const std::string_view rest = records_.Content().substr(std::min(at_, records_.Content().size()));
+      const auto count = static_cast<uint32_t>(std::min<size_t>(left, rest.size() / width));
+      if (count == 0) at_ = records_.Content().size();
+      const std::string_view bytes = rest.substr(0, count * width);
+      more = findings_.AddText(width == 2 ? FromUtf16Little(bytes) : FromCodePage(bytes, 1252));
+      at_ += bytes.size();
+      left -= count;
+    }
+    findings_.Break();
+    Skip(uint64_t{runs} * 4 + extra);
+    return more;
+  }
+
+  void Skip(uint64_t count) {
+    while (count > 0 && in_table_) {
+      const uint64_t left = records_.Content().size() - std::min(at_, records_.Content().size());
+      if (left >= count) {
+        at_ += static_cast<size_t>(count);
+        return;
+      }
+      count -= left;
+      NextRecord();
+    }
+  }
+
+  Records& records_;
+  Findings& findings_;
+  size_t at_ = 0;
+  bool in_table_ = true;
+  bool ended_ = false;
+};
+
+class WorkbookReader {
+ public:
+  WorkbookReader(CompoundStream& stream, Findings& findings) : records_(stream), findings_(findings) {}
+
+  void Read() {
+    bool have = records_.Next();
+    if (!have || records_.Type() != kBof) return findings_.Fail("damaged");
+    biff8_ = Little16(records_.Content(), 0) == kBiff8;
+    while (have) {
+      if (records_.Type() == kSharedTexts && biff8_) {
+        have = SharedTexts(records_, findings_).Add();
+      } else {
+        have = Take(records_.Content()) && records_.Next();
+      }
+    }
+  }
+
+ private:
+  /// False when nothing more is to be read.
+  bool Take(std::string_view record) {
+    switch (records_.Type()) {
+      case kFilePass:
+        findings_.Fail("encrypted");
+        return false;
+      case kCodePage:
+        code_page_ = Little16(record, 0);
+        return true;
+      case kDateMode:
+        from_1904_ = Little16(record, 0) != 0;
+        return true;
+      case kFormat:
+        return TakeFormat(record);
+      case kExtendedFormat:
+        return TakeStyle(record);
+      case kBoundSheet:
+        return AddLine(Text(record, 6, 1));
+      case kLabel:
+      case kRichLabel:
+        return AddCell(record, Text(record, 6, 2));
+      case kFormulaText:
+        return AddCell(record, Text(record, 0, 2));
+      case kNumber:
+        return AddNumber(record, Double(record, 6));
+      case kShortNumber:
+        return AddNumber(record, Short(Little32(record, 6)));
+      case kShortNumbers:
+        return AddShortNumbers(record);
+      case kFormula:
+        return Little16(record, 12) == 0xFFFF || AddNumber(record, Double(record, 6));
+      default:
+        return true;
+    }
+  }
+
+  bool TakeFormat(std::string_view record) {
+    if (date_formats_.size() < kStylesMax && IsDateFormat(Text(record, 2, biff8_ ? 2 : 1))) {
+      date_formats_.insert(Little16(record, 0));
+    }
+    return true;
+  }
+
+  bool TakeStyle(std::string_view record) {
+    const int format = Little16(record, 2);
+    if (style_is_date_.size() < kStylesMax) {
+      style_is_date_.push_back(date_formats_.contains(format) || IsBuiltInDateFormat(format));
+    }
+    return true;
+  }
+
+  /// The text at `at`, with its length in `length_bytes` before it.
+  std::string Text(std::string_view record, size_t at, size_t length_bytes) const {
+    const auto length = static_cast<size_t>(LittleEndian(record, at, length_bytes));
+    at += length_bytes;
+    const bool wide = biff8_ && at < record.size() && (record[at] & 1) != 0;
+    if (biff8_) ++at;
+    const std::string_view bytes = record.substr(std::min(at, record.size()), length * (wide ? 2 : 1));
+    return wide ? FromUtf16Little(bytes) : FromCodePage(bytes, biff8_ ? 1252 : code_page_);
+  }
+
+  static double Double(std::string_view record, size_t at) {
+    return std::bit_cast<double>(LittleEndian(record, at, 8));
+  }
+
+  /// A number in 30 bits: an integer or the upper part of a float, perhaps to be divided by 100.
+  static double Short(uint32_t packed) {
+    const double value = (packed & 2) != 0 ? static_cast<double>(static_cast<int32_t>(packed) >> 2)
+                                           : std::bit_cast<double>(uint64_t{packed & ~3U} << 32);
+    return (packed & 1) != 0 ? value / 100 : value;
+  }
+
+  bool AddShortNumbers(std::string_view record) {
+    for (size_t at = 4; at + 6 + 2 <= record.size(); at += 6) {
+      if (!AddValue(Little16(record, 0), Little16(record, at), Short(Little32(record, at + 2)))) return false;
+    }
+    return true;
+  }
+
+  bool AddNumber(std::string_view record, double value) {
+    return AddValue(Little16(record, 0), Little16(record, 4), value);
+  }
+
+  bool AddValue(uint16_t row, uint16_t style, double value) {
+    const bool is_date = style < style_is_date_.size() && style_is_date_[style];
+    return AddInRow(row, NumberText(value, is_date, from_1904_));
+  }
+
+  bool AddCell(std::string_view record, const std::string& text) {
+    return AddInRow(records_.Type() == kFormulaText ? row_ : Little16(record, 0), text);
+  }
+
+  bool AddInRow(uint16_t row, const std::string& text) {
+    if (row != row_) findings_.Break();
+    row_ = row;
+    return findings_.AddText(text) && findings_.AddText("\t");
+  }
+
+  bool AddLine(const std::string& text) {
+    const bool more = findings_.AddText(text);
+    findings_.Break();
+    return more;
+  }
+
+  Records records_;
+  Findings& findings_;
+  bool biff8_ = true;
+  bool from_1904_ = false;
+  int code_page_ = 1252;
+  uint16_t row_ = 0;
+  std::set<int> date_formats_;
+  std::vector<bool> style_is_date_;
+};
+
+}  // namespace
+
+void ReadOldExcel(CompoundStream& book, Findings& findings) { WorkbookReader(book, findings).Read(); }
+
+}  // namespace ferrox::extract

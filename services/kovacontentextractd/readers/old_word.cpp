@@ -1,0 +1,120 @@
+#include <algorithm>
+#include <string>
+
+#include "services/kovacontentextractd/readers/code_pages.h"
+#include "services/kovacontentextractd/readers/little_endian.h"
+#include "services/kovacontentextractd/readers/old_office_parts.h"
+#include "services/kovacontentextractd/readers/utf8.h"
+
+namespace ferrox::extract {
+
+namespace {
+
+constexpr size_t kHeaderBytes = 1024;
+constexpr size_t kPieceBytes = 32U << 10;
+constexpr uint32_t kPieceTableMax = 8U << 20;
+constexpr uint16_t kWord97 = 0x00C1;
+
+/// Makes text of Word's characters: marks of paragraphs and cells, and fields, whose instructions are left out.
+class WordText {
+ public:
+  explicit WordText(Findings& findings) : findings_(findings) {}
+  ~WordText() { Flush(); }
+  WordText(const WordText&) = delete;
+  WordText& operator=(const WordText&) = delete;
+
+  /// False when the findings take no more.
+  bool Add(uint32_t code) {
+    constexpr uint32_t kFieldBegin = 0x13, kFieldSeparator = 0x14, kFieldEnd = 0x15;
+    if (code == kFieldBegin) instructions_ = std::min(instructions_ + 1, 1000);
+    if ((code == kFieldSeparator || code == kFieldEnd) && instructions_ > 0) --instructions_;
+    if (instructions_ > 0) return true;
+    if (code == '\r' || code == 0x0B || code == 0x0C) {
+      text_ += '\n';
+    } else if (code == 0x07 || code == '\t') {
+      text_ += '\t';
+    } else if (code == 0x1E) {
+      text_ += '-';
+    } else if (code >= ' ') {
+      AppendUtf8(text_, code);
+    }
+    return text_.size() < kPieceBytes || Flush();
+  }
+
+  bool Flush() {
+    const bool more = findings_.AddText(text_);
+    text_.clear();
+    return more;
+  }
+
+ private:
+  Findings& findings_;
+  std::string text_;
+  int instructions_ = 0;  ///< fields whose instructions we are in
+};
+
+/// Adds `size` bytes of text at `offset`, of one or two bytes a character.
+bool AddPiece(const CompoundStream& document, uint64_t offset, uint64_t size, bool wide, WordText& text) {
+  const uint64_t end = std::min(offset + size, document.Size());
+  while (offset < end) {
+    const std::string bytes =
+        document.ReadAt(offset, static_cast<size_t>(std::min<uint64_t>(kPieceBytes, end - offset)));
+    if (bytes.empty()) return true;
+    for (size_t i = 0; i + (wide ? 2 : 1) <= bytes.size(); i += wide ? 2 : 1) {
+      uint32_t code = wide ? Little16(bytes, i) : FromWindows1252(static_cast<unsigned char>(bytes[i]));
+      if (wide && code >= 0xD800 && code <= 0xDBFF && (Little16(bytes, i + 2) & 0xFC00) == 0xDC00) {
+        code = 0x10000 + ((code & 0x3FF) << 10) + (Little16(bytes, i + 2) & 0x3FFU);
+        i += 2;
+      }
+      if (!text.Add(code)) return false;
+    }
+    offset += bytes.size();
+  }
+  return true;
+}
+
+/// The table of the pieces that the text is made of, behind a list of changes to formats.
+std::string PieceTable(const CompoundFile& file, const std::string& header) {
+  const bool one = (Little16(header, 0x0A) & 0x0200) != 0;
+  const auto stream = file.Open(one ? "1Table" : "0Table");
+  if (stream == nullptr) return {};
+  const uint32_t size = std::min(Little32(header, 0x1A6), kPieceTableMax);
+  const std::string clx = stream->ReadAt(Little32(header, 0x1A2), size);
+  size_t at = 0;
+  while (at + 3 <= clx.size() && clx[at] == 1) at += 3 + size_t{Little16(clx, at + 1)};
+  return at + 5 <= clx.size() && clx[at] == 2 ? clx.substr(at + 5, Little32(clx, at + 1)) : std::string();
+}
+
+void AddPieces(const CompoundStream& document, const std::string& table, Findings& findings) {
+  constexpr size_t kPositionBytes = 4, kDescriptorBytes = 8;
+  constexpr uint32_t kNarrow = 0x40000000;
+  const size_t count =
+      table.size() < kPositionBytes ? 0 : (table.size() - kPositionBytes) / (kPositionBytes + kDescriptorBytes);
+  WordText text(findings);
+  for (size_t i = 0; i < count; ++i) {
+    const uint32_t begin = Little32(table, i * kPositionBytes), end = Little32(table, (i + 1) * kPositionBytes);
+    const uint32_t place = Little32(table, (count + 1) * kPositionBytes + i * kDescriptorBytes + 2);
+    if (end <= begin) continue;
+    const bool wide = (place & kNarrow) == 0;
+    const uint64_t offset = wide ? place : (place & ~kNarrow) / 2;
+    if (!AddPiece(document, offset, uint64_t{end - begin} * (wide ? 2 : 1), wide, text)) return;
+  }
+}
+
+}  // namespace
+
+void ReadOldWord(const CompoundFile& file, Findings& findings) {
+  const auto document = file.Open("WordDocument");
+  const std::string header = document->ReadAt(0, kHeaderBytes);
+  if (header.size() < 0x20) return findings.Fail("damaged");
+  if ((Little16(header, 0x0A) & 0x0100) != 0) return findings.Fail("encrypted");
+  const std::string table = Little16(header, 2) >= kWord97 ? PieceTable(file, header) : std::string();
+  if (!table.empty()) return AddPieces(*document, table, findings);
+  // Before Word 97, and where the table is lost: the text stands in one piece, in the encoding of its country.
+  const uint32_t begin = Little32(header, 0x18), end = Little32(header, 0x1C);
+  if (end <= begin) return findings.Fail("damaged");
+  WordText text(findings);
+  (void)AddPiece(*document, begin, end - begin, false, text);
+}
+
+}  // namespace ferrox::extract

@@ -1,0 +1,358 @@
+#include "services/kovacontentextractd/readers/rich_text.h"
+
+#include <algorithm>
+#include <array>
+#include <map>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "services/kovacontentextractd/readers/byte_source.h"
+#include "services/kovacontentextractd/readers/code_pages.h"
+#include "services/kovacontentextractd/readers/times.h"
+#include "services/kovacontentextractd/readers/utf8.h"
+
+namespace ferrox::extract {
+
+namespace {
+
+using namespace std::literals;
+
+constexpr size_t kDepthMax = 2000;
+constexpr size_t kFontsMax = 10000;
+constexpr size_t kPieceBytes = 32U << 10;
+
+/// Where text goes in a group.
+enum class Target : uint8_t { kText, kNowhere, kFontTable, kField };
+
+struct Group {
+  Target target = Target::kText;
+  const char* field = nullptr;  ///< of kField
+  int code_page = 1252;
+  int unicode_fallback = 1;  ///< characters behind a Unicode one, for programs that do not know it
+};
+
+struct NamedTarget {
+  std::string_view word;
+  Target target;
+  const char* field = nullptr;
+};
+
+constexpr NamedTarget kTargets[] = {
+    {"fonttbl", Target::kFontTable},
+    {"title", Target::kField, "KOVAMDTitle"},
+    {"subject", Target::kField, "KOVAMDDescription"},
+    {"author", Target::kField, "KOVAMDAuthors"},
+    {"operator", Target::kField, "KOVAMDContributors"},
+    {"keywords", Target::kField, "KOVAMDKeywords"},
+    {"category", Target::kField, "KOVAMDKeywords"},
+    {"doccomm", Target::kField, "KOVAMDComment"},
+    {"company", Target::kField, "KOVAMDOrganizations"},
+    {"generator", Target::kField, "KOVAMDCreator"},
+    {"info", Target::kNowhere},
+    {"colortbl", Target::kNowhere},
+    {"stylesheet", Target::kNowhere},
+    {"pict", Target::kNowhere},
+    {"objdata", Target::kNowhere},
+    {"fldinst", Target::kNowhere},
+    {"listtable", Target::kNowhere},
+    {"listoverridetable", Target::kNowhere},
+    {"themedata", Target::kNowhere},
+    {"datastore", Target::kNowhere},
+    {"xmlnstbl", Target::kNowhere},
+    {"rsidtbl", Target::kNowhere},
+    {"filetbl", Target::kNowhere},
+    {"revtbl", Target::kNowhere},
+    {"bkmkstart", Target::kNowhere},
+    {"bkmkend", Target::kNowhere},
+    {"shppict", Target::kText},
+    {"footnote", Target::kText},
+    {"annotation", Target::kText},
+    {"shptxt", Target::kText},
+};
+
+struct NamedCharacter {
+  std::string_view word;
+  uint32_t code;
+};
+
+constexpr NamedCharacter kCharacters[] = {
+    {"par", '\n'},      {"line", '\n'},     {"row", '\n'},      {"sect", '\n'},        {"page", '\n'},
+    {"cell", '\t'},     {"nestcell", '\t'}, {"tab", '\t'},      {"emdash", 0x2014},    {"endash", 0x2013},
+    {"bullet", 0x2022}, {"lquote", 0x2018}, {"rquote", 0x2019}, {"ldblquote", 0x201C}, {"rdblquote", 0x201D},
+    {"emspace", ' '},   {"enspace", ' '},
+};
+
+/// The code page of a font's character set.
+int CodePageOf(int charset) {
+  static constexpr std::array<std::pair<int, int>, 17> kCharsets = {{{0, 1252},
+                                                                     {77, 1252},
+                                                                     {128, 932},
+                                                                     {129, 949},
+                                                                     {130, 1361},
+                                                                     {134, 936},
+                                                                     {136, 950},
+                                                                     {161, 1253},
+                                                                     {162, 1254},
+                                                                     {163, 1258},
+                                                                     {177, 1255},
+                                                                     {178, 1256},
+                                                                     {186, 1257},
+                                                                     {204, 1251},
+                                                                     {222, 874},
+                                                                     {238, 1250},
+                                                                     {255, 437}}};
+  for (const auto& [number, code_page] : kCharsets) {
+    if (number == charset) return code_page;
+  }
+  return 0;
+}
+
+bool IsLetter(int c) { return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z'); }
+
+int HexDigit(int c) {
+  if (c >= '0' && c <= '9') return c - '0';
+  const int lower = c | 0x20;
+  return lower >= 'a' && lower <= 'f' ? lower - 'a' + 10 : -1;
+}
+
+class RichTextReader {
+ public:
+  RichTextReader(const Source& source, Findings& findings) : source_(source), findings_(findings), groups_(1) {}
+
+  void Read() {
+    for (int c = Get(); c >= 0 && !done_; c = Get()) {
+      if (c == '{') {
+        Open();
+      } else if (c == '}') {
+        Close();
+      } else if (c == '\\') {
+        ReadControl();
+      } else if (c != '\r' && c != '\n') {
+        AddByte(static_cast<char>(c));
+      }
+    }
+    FlushBytes();
+    FlushText();
+  }
+
+ private:
+  Group& Top() { return groups_.back(); }
+
+  int Get() {
+    if (at_ == size_) {
+      size_ = source_.Read(buffer_.data(), buffer_.size());
+      at_ = 0;
+    }
+    return at_ < size_ ? static_cast<unsigned char>(buffer_[at_++]) : -1;
+  }
+  void Unget() { --at_; }
+
+  void Open() {
+    FlushBytes();
+    if (groups_.size() == kDepthMax) return Stop("damaged");
+    groups_.push_back(Top());
+    optional_ = false;
+  }
+
+  void Close() {
+    FlushBytes();
+    const Group closed = Top();
+    if (groups_.size() > 1) groups_.pop_back();
+    fallback_left_ = 0;
+    if (closed.target != Target::kField || Top().target == Target::kField) return;
+    findings_.Append(closed.field, value_);
+    value_.clear();
+  }
+
+  void ReadControl() {
+    const int c = Get();
+    if (c == '\'') return ReadHexByte();
+    if (!IsLetter(c)) return ReadSymbol(c);
+    std::string word;
+    int next = c;
+    for (; IsLetter(next); next = Get()) {
+      if (word.size() < 32) word += static_cast<char>(next);
+    }
+    const bool negative = next == '-';
+    if (negative) next = Get();
+    int64_t number = 0;
+    bool has_number = false;
+    for (; next >= '0' && next <= '9'; next = Get()) {
+      number = std::min<int64_t>(number * 10 + (next - '0'), INT32_MAX);
+      has_number = true;
+    }
+    if (next >= 0 && next != ' ') Unget();
+    Do(word, has_number ? static_cast<int>(negative ? -number : number) : 1);
+  }
+
+  void ReadHexByte() {
+    const int high = HexDigit(Get()), low = HexDigit(Get());
+    if (high >= 0 && low >= 0) AddByte(static_cast<char>(high * 16 + low));
+  }
+
+  void ReadSymbol(int c) {
+    if (c == '\\' || c == '{' || c == '}') return AddByte(static_cast<char>(c));
+    if (c == '~') return AddCharacter(' ');
+    if (c == '_') return AddCharacter('-');
+    if (c == '\r' || c == '\n') return AddCharacter('\n');
+    if (c == '*') optional_ = true;
+  }
+
+  void Do(std::string_view word, int number) {
+    if (word == "u"sv) return AddUnicode(number);
+    if (word == "uc"sv) {
+      Top().unicode_fallback = std::clamp(number, 0, 100);
+      return;
+    }
+    if (word == "bin"sv) return SkipBytes(number);
+    if (word == "f"sv) return SelectFont(number);
+    if (word == "fcharset"sv) return SetCharset(number);
+    if (word == "ansicpg"sv) {
+      if (number > 1) ansi_code_page_ = Top().code_page = number;
+      return;
+    }
+    if (word == "mac"sv || word == "pc"sv) {
+      ansi_code_page_ = Top().code_page = word == "pc"sv ? 437 : 1252;
+      return;
+    }
+    for (const NamedCharacter& character : kCharacters) {
+      if (character.word == word) return AddCharacter(character.code);
+    }
+    if (word == "creatim"sv) return ReadTime();
+    SetTarget(word);
+  }
+
+  /// A group that begins with "\*" and a word that we do not know is for others.
+  void SetTarget(std::string_view word) {
+    const auto* found = std::find_if(std::begin(kTargets), std::end(kTargets),
+                                     [&](const NamedTarget& target) { return target.word == word; });
+    const bool known = found != std::end(kTargets);
+    if (!known && !optional_) return;
+    optional_ = false;
+    FlushBytes();
+    const bool in_nothing = Top().target == Target::kNowhere && (!known || found->target != Target::kField);
+    if (in_nothing) return;
+    Top().target = known ? found->target : Target::kNowhere;
+    Top().field = known ? found->field : nullptr;
+  }
+
+  void SelectFont(int number) {
+    FlushBytes();
+    if (Top().target == Target::kFontTable) {
+      font_ = number;
+      return;
+    }
+    const auto found = fonts_.find(number);
+    Top().code_page = found != fonts_.end() && found->second != 0 ? found->second : ansi_code_page_;
+  }
+
+  void SetCharset(int charset) {
+    if (Top().target == Target::kFontTable && fonts_.size() < kFontsMax) {
+      fonts_[font_] = charset <= 1 ? ansi_code_page_ : CodePageOf(charset);
+    }
+  }
+
+  /// "\yr2024\mo3\dy1\hr12\min30" in the rest of the group.
+  void ReadTime() {
+    CivilTime time;
+    std::string text;
+    for (int c = Get(); c >= 0 && c != '}' && text.size() < 200; c = Get()) text += static_cast<char>(c);
+    Unget();
+    const auto number = [&](std::string_view word) {
+      const size_t at = text.find(word);
+      int value = 0;
+      for (size_t i = at + word.size(); at != std::string::npos && i < text.size() && value < 100000; ++i) {
+        if (text[i] < '0' || text[i] > '9') break;
+        value = value * 10 + (text[i] - '0');
+      }
+      return value;
+    };
+    time = {number("\\yr"), number("\\mo"), number("\\dy"), number("\\hr"), number("\\min"), 0};
+    if (const auto seconds = ToSeconds(time)) findings_.SetInteger("KOVAMDContentCreationDate", *seconds);
+  }
+
+  void SkipBytes(int count) {
+    for (; count > 0 && Get() >= 0; --count) continue;
+  }
+
+  void AddByte(char byte) {
+    if (fallback_left_ > 0) {
+      --fallback_left_;
+      return;
+    }
+    if (Top().target == Target::kNowhere || Top().target == Target::kFontTable) return;
+    bytes_ += byte;
+    if (bytes_.size() >= kPieceBytes) FlushBytes();
+  }
+
+  void AddUnicode(int number) {
+    FlushBytes();
+    const auto unit = static_cast<uint16_t>(number);  // written as a signed number
+    fallback_left_ = Top().unicode_fallback;
+    if ((unit & 0xFC00) == 0xD800) {
+      high_surrogate_ = unit;
+    } else if ((unit & 0xFC00) == 0xDC00 && high_surrogate_ != 0) {
+      AddCharacter(0x10000 + ((high_surrogate_ & 0x3FFU) << 10) + (unit & 0x3FFU));
+      high_surrogate_ = 0;
+    } else {
+      AddCharacter(unit);
+    }
+  }
+
+  void AddCharacter(uint32_t code) {
+    FlushBytes();
+    std::string* out = Out();
+    if (out != nullptr) AppendUtf8(*out, code);
+    if (text_.size() >= kPieceBytes) FlushText();
+  }
+
+  /// Bytes become text when it is known that no more of their encoding follow.
+  void FlushBytes() {
+    if (bytes_.empty()) return;
+    std::string* out = Out();
+    if (out != nullptr) *out += FromCodePage(bytes_, Top().code_page);
+    bytes_.clear();
+    if (text_.size() >= kPieceBytes) FlushText();
+  }
+
+  std::string* Out() {
+    if (Top().target == Target::kText) return &text_;
+    return Top().target == Target::kField && value_.size() < kPieceBytes ? &value_ : nullptr;
+  }
+
+  void FlushText() {
+    if (!findings_.AddText(text_)) done_ = true;
+    text_.clear();
+  }
+
+  void Stop(std::string_view reason) {
+    findings_.Fail(reason);
+    done_ = true;
+  }
+
+  FileSource source_;
+  Findings& findings_;
+  std::array<char, 16384> buffer_;
+  size_t at_ = 0, size_ = 0;
+  std::vector<Group> groups_;
+  std::map<int, int> fonts_;  ///< their code pages
+  int font_ = 0;              ///< the one in the table that is being read
+  int ansi_code_page_ = 1252;
+  bool optional_ = false;
+  int fallback_left_ = 0;
+  uint32_t high_surrogate_ = 0;
+  std::string bytes_;  ///< in the group's code page
+  std::string text_;
+  std::string value_;  ///< of a field
+  bool done_ = false;
+};
+
+}  // namespace
+
+void ReadRichText(const Source& source, Findings& findings) {
+  if (FileBytes(source).ReadAt(0, 5) != "{\\rtf") return findings.Fail("damaged");
+  RichTextReader(source, findings).Read();
+}
+
+}  // namespace ferrox::extract

@@ -1,0 +1,89 @@
+#include <algorithm>
+
+#include "services/kovacontentextractd/readers/code_pages.h"
+#include "services/kovacontentextractd/readers/little_endian.h"
+#include "services/kovacontentextractd/readers/old_office_parts.h"
+
+namespace ferrox::extract {
+
+namespace {
+
+constexpr size_t kSetMaxBytes = 1U << 20;
+constexpr uint32_t kPropertiesMax = 1000;
+constexpr uint32_t kCodePageId = 1;
+enum ValueType : uint32_t { kInt16 = 2, kInt32 = 3, kBytes = 30, kUtf16 = 31, kFileTime = 64 };
+
+struct Property {
+  uint32_t id;
+  const char* field;
+};
+
+constexpr Property kSummary[] = {
+    {2, "KOVAMDTitle"},
+    {3, "KOVAMDDescription"},
+    {4, "KOVAMDAuthors"},
+    {5, "KOVAMDKeywords"},
+    {6, "KOVAMDComment"},
+    {8, "KOVAMDContributors"},
+    {12, "KOVAMDContentCreationDate"},
+    {13, "KOVAMDContentModificationDate"},
+    {14, "KOVAMDNumberOfPages"},
+    {18, "KOVAMDCreator"},
+    {18, "KOVAMDEncodingApplications"},
+};
+constexpr Property kDocumentSummary[] = {
+    {2, "KOVAMDKeywords"},
+    {7, "KOVAMDNumberOfPages"},
+    {15, "KOVAMDOrganizations"},
+};
+
+/// Sets one field from the value at `at`: its type, then what the type has.
+void SetValue(std::string_view set, size_t at, int code_page, const char* field, Findings& findings) {
+  const uint32_t type = Little32(set, at) & 0xFFFF;
+  const std::string_view value = set.substr(std::min(at + 4, set.size()));
+  const std::string_view text = value.substr(std::min<size_t>(4, value.size()));
+  if (type == kBytes) {
+    const std::string_view bytes = text.substr(0, Little32(value, 0));
+    findings.Append(field, FromCodePage(bytes.substr(0, bytes.find('\0')), code_page));
+  } else if (type == kUtf16) {
+    findings.Append(field, FromUtf16Little(text.substr(0, size_t{Little32(value, 0)} * 2)));
+  } else if (type == kInt16 || type == kInt32) {
+    const auto number = static_cast<int32_t>(type == kInt16 ? Little16(value, 0) : Little32(value, 0));
+    if (number > 0) findings.SetInteger(field, number);
+  } else if (type == kFileTime) {
+    constexpr int64_t kTicksPerSecond = 10000000, kSecondsTo1970 = 11644473600;
+    const auto ticks = static_cast<int64_t>(LittleEndian(value, 0, 8) & INT64_MAX);
+    if (ticks > kSecondsTo1970 * kTicksPerSecond) findings.SetInteger(field, ticks / kTicksPerSecond - kSecondsTo1970);
+  }
+}
+
+template <size_t Count>
+void AddSet(const CompoundFile& file, std::string_view name, const Property (&properties)[Count], Findings& findings) {
+  const auto stream = file.Open(name);
+  const std::string bytes = stream != nullptr ? stream->ReadAt(0, kSetMaxBytes) : std::string();
+  const uint32_t begin = Little32(bytes, 44);
+  if (bytes.size() < 48 || begin >= bytes.size()) return;
+  const std::string_view set = std::string_view(bytes).substr(begin);
+  const uint32_t count = std::min(Little32(set, 4), kPropertiesMax);
+  const auto each = [&](const auto& take) {
+    for (uint32_t i = 0; i < count; ++i) take(Little32(set, 8 + i * 8), Little32(set, 12 + i * 8));
+  };
+  int code_page = 1252;
+  each([&](uint32_t id, uint32_t at) {
+    if (id == kCodePageId) code_page = Little16(set, size_t{at} + 4);
+  });
+  each([&](uint32_t id, uint32_t at) {
+    for (const Property& property : properties) {
+      if (property.id == id) SetValue(set, at, code_page, property.field, findings);
+    }
+  });
+}
+
+}  // namespace
+
+void AddSummaryInformation(const CompoundFile& file, Findings& findings) {
+  AddSet(file, "\005SummaryInformation", kSummary, findings);
+  AddSet(file, "\005DocumentSummaryInformation", kDocumentSummary, findings);
+}
+
+}  // namespace ferrox::extract
