@@ -172,7 +172,7 @@ const char kRichText[] =
     "SimSun;}}"
     "{\\colortbl;\\red0;}{\\info{\\title Bericht f\\'fcr {\\b alle}}{\\author "
     "Anna}{\\creatim\\yr2024\\mo3\\dy1\\hr12\\min0}}"
-    "{\\*\\unknown hidden}{\\pict\\bin3 {}}\\f0 Gr\\'fc\\'dfe\\par {\\f1 \\'ec\\'e8\\'f0}, "
+    "{\\*\\unknown hidden}{\\pict\\bin2 {}}\\f0 Gr\\'fc\\'dfe\\par {\\f1 \\'ec\\'e8\\'f0}, "
     "\\f2\\'d6\\'d0\\'ce\\'c4\\par\\f0 "
     "\\u26481?\\u20140?{\\uc0\\u55357\\u56832}{\\field{\\*\\fldinst HYPERLINK x}{\\fldrslt "
     "link}}\\cell\\{x\\}\\emdash\\row}";

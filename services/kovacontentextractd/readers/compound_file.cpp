@@ -49,6 +49,7 @@ size_t CompoundStream::Read(char* buffer, size_t room) {
 }
 
 CompoundFile::CompoundFile(const Source& source) : file_(source) {
+  mini_stream_.file_ = this;
   const std::string header = file_.ReadAt(0, kHeaderBytes);
   sector_shift_ = Little16(header, 0x1E);
   mini_shift_ = Little16(header, 0x20);
@@ -121,8 +122,7 @@ void CompoundFile::ReadEntries(uint32_t first) {
       const uint32_t start = Little32(entry, 116);
       const uint64_t size = Little32(entry, 120);  // bigger ones are not office files
       const auto type = static_cast<uint8_t>(entry[66]);
-      if (type == kRoot && mini_stream_.file_ == nullptr) {
-        mini_stream_.file_ = this;
+      if (type == kRoot && mini_stream_.sectors_.empty()) {
         mini_stream_.sectors_ = Chain(table_, start);
         mini_stream_.size_ = std::min<uint64_t>(size, uint64_t{mini_stream_.sectors_.size()} << sector_shift_);
       } else if (type == kStream && entries_.size() < kEntriesMax) {

@@ -37,6 +37,8 @@ class CompoundStream : public ByteSource {
 class CompoundFile {
  public:
   explicit CompoundFile(const Source& source);
+  CompoundFile(const CompoundFile&) = delete;
+  CompoundFile& operator=(const CompoundFile&) = delete;
   bool IsOpen() const { return open_; }
   /// The first stream of this name, in whatever storage; null when there is none.
   std::unique_ptr<CompoundStream> Open(std::string_view name) const;
