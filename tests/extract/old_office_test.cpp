@@ -170,7 +170,7 @@ std::string PowerPointSample() {
 const char kRichText[] =
     "{\\rtf1\\ansi\\ansicpg1252{\\fonttbl{\\f0\\fcharset0 Arial;}{\\f1\\fcharset204 Arial Cyr;}{\\f2\\fcharset134 "
     "SimSun;}}"
-    "{\\colortbl;\\red0;}{\\info{\\title Bericht f\\'fcr {\\b alle}}{\\author "
+    "{\\colortbl;\\red0;}{\\info{\\upr{\\title Bericht ?}{\\*\\ud{\\title Bericht f\\'fcr {\\b \\u1074?}}}}{\\author "
     "Anna}{\\creatim\\yr2024\\mo3\\dy1\\hr12\\min0}}"
     "{\\*\\unknown hidden}{\\pict\\bin2 {}}\\f0 Gr\\'fc\\'dfe\\par {\\f1 \\'ec\\'e8\\'f0}, "
     "\\f2\\'d6\\'d0\\'ce\\'c4\\par\\f0 "
@@ -222,7 +222,7 @@ TEST(OldOfficeTest, CyclesAndDamageAreBorne) {
 TEST(RichTextTest, CodePagesUnicodeAndInformation) {
   const Json::Value document = Read(&ReadRichText, std::string(kRichText, sizeof kRichText - 1), "rtf");
   EXPECT_EQ("Grüße\nмир, 中文\n東京😀link\t{x}—\n", Text(document));
-  EXPECT_EQ("Bericht für alle", Text(document, "KOVAMDTitle"));
+  EXPECT_EQ("Bericht für в", Text(document, "KOVAMDTitle"));
   EXPECT_EQ("Anna", Text(document, "KOVAMDAuthors"));
   EXPECT_EQ(1709294400, document["KOVAMDContentCreationDate"].asInt64());
 }

@@ -29,6 +29,7 @@ struct Group {
   Target target = Target::kText;
   const char* field = nullptr;  ///< of kField
   int code_page = 1252;
+  bool is_unicode = false;   ///< holds again, whole, what a group before it has in a code page
   int unicode_fallback = 1;  ///< characters behind a Unicode one, for programs that do not know it
 };
 
@@ -161,7 +162,8 @@ class RichTextReader {
     if (groups_.size() > 1) groups_.pop_back();
     fallback_left_ = 0;
     if (closed.target != Target::kField || Top().target == Target::kField) return;
-    findings_.Append(closed.field, value_);
+    if (closed.is_unicode) findings_.Set(closed.field, value_);
+    if (!closed.is_unicode) findings_.Append(closed.field, value_);
     value_.clear();
   }
 
@@ -220,6 +222,11 @@ class RichTextReader {
       if (character.word == word) return AddCharacter(character.code);
     }
     if (word == "creatim"sv) return ReadTime();
+    if (word == "ud"sv) {
+      Top().is_unicode = true;
+      optional_ = false;
+      return;
+    }
     SetTarget(word);
   }
 
