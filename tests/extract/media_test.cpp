@@ -168,8 +168,8 @@ TEST(MediaTest, DamageIsBorne) {
   Abuse(&ReadAudio, Flac(), "flac");
   Abuse(&ReadAudio, Wav(), "wav");
   Abuse(&ReadAudio, Dsf(), "dsf");
-  Abuse(&ReadVideo, Mp4(), "mp4");
-  Abuse(&ReadVideo, Matroska(), "mkv");
+  Abuse(&ReadVideo, Mp4(), "mp4", 100);
+  Abuse(&ReadVideo, Matroska(), "mkv", 100);
 }
 
 }  // namespace ferrox::extract::test

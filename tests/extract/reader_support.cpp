@@ -22,14 +22,14 @@ Json::Value Read(Reader reader, const std::string& bytes, const std::string& ext
   return document;
 }
 
-void Abuse(Reader reader, const std::string& sample, const std::string& extension) {
+void Abuse(Reader reader, const std::string& sample, const std::string& extension, int changes) {
   constexpr uint32_t kSeed = 20240301;
   SCOPED_TRACE("seed " + std::to_string(kSeed) + " of a " + extension);
   std::mt19937 random(kSeed);
   const auto below = [&](size_t end) { return static_cast<size_t>(random() % end); };
   const auto start = std::chrono::steady_clock::now();
   for (size_t i = 0; i < 20; ++i) (void)Read(reader, sample.substr(0, sample.size() * i / 20), extension);
-  for (int i = 0; i < 300; ++i) {
+  for (int i = 0; i < changes; ++i) {
     std::string changed = sample;
     for (size_t count = 1 + below(8); count > 0; --count) {
       const size_t at = below(changed.size());
@@ -73,7 +73,7 @@ std::string MakeZip(const Members& members) {
 
 std::string Little(uint64_t value, int bytes) {
   std::string out;
-  for (int i = 0; i < bytes; ++i) out += static_cast<char>(value >> (8 * i));
+  for (int i = 0; i < bytes; ++i) out += static_cast<char>(i < 8 ? value >> (8 * i) : 0);
   return out;
 }
 
