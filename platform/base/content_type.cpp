@@ -1,4 +1,5 @@
 #include <algorithm>
+#include <initializer_list>
 #include <iterator>
 
 #include <kova/content_type.h>
@@ -149,7 +150,7 @@ constexpr ExtensionRow kExtensions[] = {
     {"editorconfig", "text/plain"},
     {"edn", "text/x-clojure"},
     {"el", "text/x-lisp"},
-    {"eml", "text/plain"},
+    {"eml", "message/rfc822"},
     {"ent", "application/xml-dtd"},
     {"env", "text/plain"},
     {"eot", "application/x-font"},
@@ -290,7 +291,7 @@ constexpr ExtensionRow kExtensions[] = {
     {"map", "text/plain"},
     {"markdown", "text/markdown"},
     {"mathml", "application/mathml+xml"},
-    {"mbox", "text/plain"},
+    {"mbox", "application/mbox"},
     {"md", "text/markdown"},
     {"md5sums", "text/plain"},
     {"mdown", "text/markdown"},
@@ -322,6 +323,7 @@ constexpr ExtensionRow kExtensions[] = {
     {"mp3", "audio/mpeg"},
     {"mp4", "video/mp4"},
     {"mpa", "audio/mpeg"},
+    {"mpc", "audio/x-musepack"},
     {"mpeg", "video/mpeg"},
     {"mpg", "video/mpeg"},
     {"mrw", "image/x-raw"},
@@ -418,7 +420,7 @@ constexpr ExtensionRow kExtensions[] = {
     {"psd1", "text/x-powershell"},
     {"psm1", "text/x-powershell"},
     {"psql", "text/x-sql"},
-    {"pst", "application/vnd.ms-outlook"},
+    {"pst", "application/x-outlook-pst"},
     {"ptx", "image/x-raw"},
     {"pub", "text/plain"},
     {"pxd", "text/x-python"},
@@ -565,6 +567,7 @@ constexpr ExtensionRow kExtensions[] = {
     {"woff2", "font/woff"},
     {"wri", "application/x-mswrite"},
     {"wsdl", "application/xml"},
+    {"wv", "audio/x-wavpack"},
     {"x3f", "image/x-raw"},
     {"xcf", "image/x-xcf"},
     {"xht", "application/xhtml+xml"},
@@ -619,24 +622,42 @@ constexpr MarkRow kMarks[] = {
     {0, "GIF8"sv, "image/gif", {}, true},
     {0, "II*\0"sv, "image/tiff", "image/"},
     {0, "MM\0*"sv, "image/tiff", "image/"},
-    {0, "PK\3\4"sv, "application/zip", "application/"},
-    {0, "\x1f\x8b\x08"sv, "application/gzip", "application/ image/svg"},
-    {0, "BZh"sv, "application/x-bzip2", "application/", true},
-    {0, "\xfd\x37zXZ\0"sv, "application/x-xz", "application/"},
-    {0, "\x28\xb5\x2f\xfd"sv, "application/zstd", "application/"},
+    {0, "8BPS\0"sv, "image/vnd.adobe.photoshop"},
+    {8, "WEBPVP8"sv, "image/webp", {}, true},
+    {0, "PK\3\4"sv, "application/zip",
+     "application/vnd.openxml application/vnd.oasis application/vnd.android application/vnd.visio application/epub "
+     "application/java application/x-"},
+    {0, "\x1f\x8b\x08"sv, "application/gzip", "application/x-"},
+    {0, "BZh"sv, "application/x-bzip2", {}, true},
+    {0, "\xfd\x37zXZ\0"sv, "application/x-xz"},
+    {0, "\x28\xb5\x2f\xfd"sv, "application/zstd"},
     {0, "7z\xbc\xaf\x27\x1c"sv, "application/x-7z-compressed"},
-    {0, "Rar!\x1a\x07"sv, "application/vnd.rar", "application/"},
+    {0, "Rar!\x1a\x07"sv, "application/vnd.rar"},
     {257, "ustar"sv, "application/x-tar", {}, true},
     {0, "SQLite format 3\0"sv, "application/x-sqlite3", "application/"},
-    {0, "\xd0\xcf\x11\xe0\xa1\xb1\x1a\xe1"sv, "application/x-ole-storage", "application/"},
+    {0, "\xd0\xcf\x11\xe0\xa1\xb1\x1a\xe1"sv, "application/x-ole-storage",
+     "application/vnd.ms- application/vnd.visio application/msword application/x-"},
     {0, "!<arch>\n"sv, "application/x-archive", "application/"},
     {0, "OggS"sv, "audio/ogg", "audio/ video/", true},
     {0, "fLaC"sv, "audio/flac", {}, true},
     {0, "ID3"sv, "audio/mpeg", "audio/ video/", true},
+    {0, "\xff\xfb"sv, "audio/mpeg", "audio/ video/"},
+    {8, "WAVEfmt "sv, "audio/x-wav", "audio/", true},
+    {8, "AIFF"sv, "audio/x-aiff", "audio/", true},
+    {0, "DSD \x1c\0\0\0"sv, "audio/x-dsd"},
     {0, "G@\0"sv, "video/mp2t", "video/"},
     {0, "G@\x11"sv, "video/mp2t", "video/"},
+    {4, "ftypM4A"sv, "audio/mp4", "audio/ video/", true},
+    {4, "ftyphei"sv, "image/heic", "image/", true},
+    {4, "ftypmif1"sv, "image/heic", "image/", true},
+    {4, "ftypavif"sv, "image/avif", "image/", true},
+    {4, "ftypcrx"sv, "image/x-raw", "image/", true},
+    {4, "ftypqt"sv, "video/quicktime", "video/", true},
     {4, "ftyp"sv, "video/mp4", "video/ audio/ image/", true},
     {0, "\x1a\x45\xdf\xa3"sv, "video/x-matroska", "video/ audio/"},
+    {8, "AVI LIST"sv, "video/x-msvideo", "video/", true},
+    {0, "\x30\x26\xb2\x75\x8e\x66\xcf\x11"sv, "video/x-ms-wmv", "video/ audio/"},
+    {0, "FLV\1"sv, "video/x-flv"},
     {0, "\xca\xfe\xba\xbe"sv, "application/java-vm", "application/"},
     {0, "\0asm"sv, "application/wasm"},
     {0, "{\\rtf"sv, "application/rtf"},
@@ -646,6 +667,23 @@ constexpr MarkRow kMarks[] = {
     {0, "<HTML"sv, "text/html", {}, true},
     {0, "<?xml"sv, "application/xml", {}, true},
 };
+
+/// What the first members of a ZIP file make of it.
+const char* TypeOfZip(std::string_view head) {
+  constexpr size_t kFirstName = 30;
+  constexpr std::string_view kTypeMember = "mimetype";
+  const std::string_view first = head.substr(std::min(kFirstName, head.size()));
+  if (first.substr(0, kTypeMember.size()) == kTypeMember) {
+    const std::string_view said = first.substr(kTypeMember.size());
+    for (const ExtensionRow& row : kExtensions) {
+      if (said.substr(0, std::string_view(row.type).size()) == row.type) return row.type;
+    }
+  }
+  const bool is_office = head.find("[Content_Types].xml"sv) != std::string_view::npos;
+  if (!is_office) return "application/zip";
+  if (head.find("xl/"sv) != std::string_view::npos) return TypeByExtension("xlsx");
+  return TypeByExtension(head.find("ppt/"sv) != std::string_view::npos ? "pptx" : "docx");
+}
 
 const MarkRow* MarkOf(std::string_view head) {
   for (const MarkRow& row : kMarks) {
@@ -663,11 +701,17 @@ bool Holds(const MarkRow& mark, std::string_view type) {
   return mark.type == type;
 }
 
-bool IsText(std::string_view type) {
-  static constexpr std::string_view kTextReaders[] = {"plain", "html", "xml"};
+bool IsReadBy(std::initializer_list<std::string_view> readers, std::string_view type) {
   const Format* format = FormatOf(type);
-  return format != nullptr &&
-         std::find(std::begin(kTextReaders), std::end(kTextReaders), format->reader) != std::end(kTextReaders);
+  return format != nullptr && std::find(readers.begin(), readers.end(), format->reader) != readers.end();
+}
+
+bool IsText(std::string_view type) { return IsReadBy({"plain", "html", "xml"}, type); }
+
+/// Whether a file without any mark cannot be what its name says, but may be text.
+bool IsTextUnderAnotherName(std::string_view type, std::string_view head) {
+  return IsReadBy({"pdf", "office", "open-document", "book", "old-office"}, type) &&
+         head.find('\0') == std::string_view::npos && head.find("%PDF-"sv) == std::string_view::npos;
 }
 
 }  // namespace
@@ -682,11 +726,13 @@ const char* TypeByExtension(std::string_view extension) {
 const char* TypeOf(std::string_view extension, std::string_view head) {
   const char* by_name = TypeByExtension(extension);
   const MarkRow* mark = MarkOf(head);
+  if (mark == nullptr && by_name != nullptr && IsTextUnderAnotherName(by_name, head)) return "text/plain";
   if (mark == nullptr) return by_name;
-  if (by_name == nullptr) return mark->type;
+  const char* by_mark = mark->type == "application/zip"sv ? TypeOfZip(head) : mark->type;
+  if (by_name == nullptr) return by_mark;
   const bool is_binary = head.find('\0') != std::string_view::npos;
-  if (IsText(by_name)) return mark->weak && !is_binary ? by_name : mark->type;
-  return Holds(*mark, by_name) ? by_name : mark->type;
+  if (IsText(by_name)) return mark->weak && !is_binary ? by_name : by_mark;
+  return Holds(*mark, by_name) ? by_name : by_mark;
 }
 
 }  // namespace kova::content

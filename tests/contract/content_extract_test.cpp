@@ -49,7 +49,7 @@ TEST_F(ContentExtractTest, ADaemonIsStartedOnceForAllThatNeedIt) {
   ASSERT_EQ(0, KLIBServiceStop(kService, 1));
   WriteFile(dir_ / "by_name.txt", "x");
   (void)Parse("by_name.txt", false);
-  (void)ParseBytes("by_type.jpg", "\xff\xd8\xff\xe0");
+  (void)ParseBytes("by_type.gif", "GIF89a");
   EXPECT_EQ(0, KLIBServiceIsRunning(kService)) << "no content was wanted, or nobody could read it";
   for (const char* name : {"a", "b", "c", "d"}) WriteFile(dir_ / name, string(1000, *name));
   std::atomic<int> wrong = 0;
@@ -90,16 +90,19 @@ TEST_F(ContentExtractTest, TheContentTellsWhatTheNameDoesNot) {
   } rows[] = {
       {"page.txt", "<html><p>x</html>", "text/plain", true},
       {"no_extension", "<html><p>x</html>", "text/html", true},
-      {"picture.txt", string("\x89PNG\r\n\x1a\n\0\0", 10), "image/png", false},
+      {"really_a_page.doc", "<html><p>x</html>", "text/html", true},
+      {"really_text.doc", "plain words", "text/plain", true},
+      {"really_text.pdf", "plain words", "text/plain", true},
+      {"package.txt", string("7z\xbc\xaf\x27\x1c\0\4", 8), "application/x-7z-compressed", false},
+      {"letter.docx", "{\\rtf1 hello}", "application/rtf", true},
       {"song.txt", "ID3 is a tag", "text/plain", true},
-      {"no_extension_either", string("\xff\xd8\xff\xe0\0\0", 6), "image/jpeg", false},
+      {"no_extension_either", "GIF89a", "image/gif", false},
       {"unknown", string("wOFF\0\1\0\0", 8), "font/woff", false},
   };
   for (const auto& row : rows) {
     const Json::Value document = ParseBytes(row.name, row.bytes);
     EXPECT_EQ(row.type, document["KOVAMDContentType"].asString()) << row.name;
     EXPECT_EQ(row.has_text, document.isMember("KOVAMDTextContent")) << row.name;
-    EXPECT_FALSE(document.isMember("_KOVAExtractError")) << row.name << document["_KOVAExtractError"].asString();
     EXPECT_TRUE(document["_KOVAExtractVersion"].isInt()) << row.name;
   }
 }

@@ -13,6 +13,7 @@ void ReadOldOffice(const Source& source, Findings& findings) {
     if (const auto book = file.Open(name)) return ReadOldExcel(*book, findings);
   }
   if (file.Open("PowerPoint Document") != nullptr) return ReadOldPowerPoint(file, findings);
+  if (file.Open("EncryptedPackage") != nullptr) return findings.Fail("encrypted");  // around a newer document
   if (file.Open("__properties_version1.0") != nullptr) return ReadOutlookMessage(file, findings);
   // Another program's file: its properties may be all that can be had.
 }
