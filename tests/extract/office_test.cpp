@@ -89,7 +89,10 @@ std::string OpenDocumentSample() {
        {"content.xml",
         "<office:document-content><office:automatic-styles><style:style>s</style:style></office:automatic-styles>"
         "<office:body><office:text><text:h>Überschrift</text:h><text:p>Ein<text:s text:c='2'/>Satz"
-        "<text:span> mit Ende</text:span></text:p><table:table table:name='Kosten'><text:p>42</text:p></table:table>"
+        "<text:span> mit Ende</text:span></text:p><table:table "
+        "table:name='Kosten'><table:table-row><table:table-cell><text:p>42</text:p></"
+        "table:table-cell><table:table-cell>"
+        "<text:p>43</text:p></table:table-cell></table:table-row></table:table>"
         "</office:text></office:body></office:document-content>"},
        {"meta.xml",
         "<office:document-meta><office:meta><dc:title>Bericht</dc:title><meta:initial-creator>Łukasz"
@@ -139,7 +142,7 @@ TEST(OfficeOpenTest, SlidesComeInTheOrderInWhichTheyAreShown) {
 
 TEST(OpenDocumentTest, TextAndProperties) {
   const Json::Value document = Read(&ReadOpenDocument, OpenDocumentSample(), "odt");
-  EXPECT_EQ("Überschrift\nEin Satz mit Ende\nKosten\n42\n", Text(document));
+  EXPECT_EQ("Überschrift\nEin Satz mit Ende\nKosten\n42\t43\t\n", Text(document));
   EXPECT_EQ("Bericht", Text(document, "KOVAMDTitle"));
   EXPECT_EQ("Łukasz", Text(document, "KOVAMDAuthors"));
   EXPECT_EQ("eins, zwei", Text(document, "KOVAMDKeywords"));

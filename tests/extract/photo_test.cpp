@@ -31,6 +31,26 @@ std::string Tiff() {
          std::string("\x01\x01\x03\0\x01\0\0\0\xE0\x01\0\0\0\0\0\0", 16);
 }
 
+std::string Box(const std::string& name, const std::string& content) {
+  return Big(content.size() + 8, 4) + name + content;
+}
+
+/// A HEIF file that holds nothing but EXIF, as item 1.
+std::string Heif() {
+  const std::string exif =
+      Big(0, 4) + std::string("II*\0\x08\0\0\0\x01\0", 10) + std::string("\x10\x01\x02\0\x04\0\0\0K1\0\0\0\0\0\0", 16);
+  const std::string item = Box("infe", Big(0x02000000, 4) + Big(1, 2) + Big(0, 2) + "Exif" + '\0');
+  const auto meta = [&](size_t offset) {
+    const std::string place = Big(0, 4) + Big(0x4400, 2) + Big(1, 2) + Big(1, 2) + Big(0, 2) + Big(1, 2) +
+                              Big(offset, 4) + Big(exif.size(), 4);
+    return Box("meta", Big(0, 4) + Box("hdlr", Big(0, 8) + "pict" + Big(0, 13)) +
+                           Box("iinf", Big(0, 4) + Big(1, 2) + item) + Box("iloc", place) +
+                           Box("iprp", Box("ipco", Box("ispe", Big(0, 4) + Big(4032, 4) + Big(3024, 4)))));
+  };
+  const std::string begin = Box("ftyp", "heic" + Big(0, 4) + "mif1heic");
+  return begin + meta(begin.size() + meta(0).size() + 8) + Box("mdat", exif);
+}
+
 /// The picture with what a camera, and then a person, put into it.
 std::string WithMetadata(const std::string& picture) {
   PreparePhoto();
@@ -87,8 +107,16 @@ TEST(PhotoTest, WhatCamerasAndPeoplePutIntoPictures) {
   }
 }
 
+TEST(PhotoTest, HeifHasItsExifInAnItem) {
+  const Json::Value document = Read(&ReadPhoto, Heif(), "heic");
+  EXPECT_EQ("K1", Text(document, "KOVAMDAcquisitionModel"));
+  EXPECT_EQ(4032, document["KOVAMDPixelWidth"].asInt());
+  EXPECT_EQ(3024, document["KOVAMDPixelHeight"].asInt());
+}
+
 TEST(PhotoTest, DamageIsBorne) {
   EXPECT_EQ("damaged", Text(Read(&ReadPhoto, "no picture", "jpg"), "_KOVAExtractError"));
+  Abuse(&ReadPhoto, Heif(), "heic");
   Abuse(&ReadPhoto, WithMetadata(Jpeg()), "jpg");
   Abuse(&ReadPhoto, WithMetadata(Png()), "png");
   Abuse(&ReadPhoto, WithMetadata(Webp()), "webp");

@@ -43,30 +43,61 @@ void AddBlank(std::string_view name, Findings& findings) {
   if (name == "line-break") findings.Break();
 }
 
-void AddContent(ByteSource& content, Findings& findings) {
-  XmlTokenizer xml(content);
-  int paragraphs = 0;  // a paragraph may hold others: notes, text in drawings
-  for (Token token = xml.Next(); token != Token::kEnd && token != Token::kBad; token = xml.Next()) {
-    if (token == Token::kText) {
-      if (paragraphs > 0 && !findings.AddText(xml.Text())) return;
-      continue;
-    }
-    const std::string_view name = xml.Name();
-    if (name == "p" || name == "h") {
-      paragraphs += token == Token::kOpen ? 1 : -1;
-      findings.Break();
-    } else if (token == Token::kOpen) {
-      if (name == "automatic-styles" || name == "tracked-changes" || name == "binary-data") {
-        xml.SkipElement();
-      } else if (name == "table") {
-        (void)findings.AddText(xml.PrefixedAttribute("name"));
-        findings.Break();
-      } else if (paragraphs > 0) {
-        AddBlank(name, findings);
+/// Collects the text of paragraphs, with a row of a table in a line.
+class ContentReader {
+ public:
+  ContentReader(ByteSource& content, Findings& findings) : xml_(content), findings_(findings) {}
+
+  void Read() {
+    for (Token token = xml_.Next(); token != Token::kEnd && token != Token::kBad; token = xml_.Next()) {
+      if (token == Token::kText) {
+        if (paragraphs_ > 0 && !findings_.AddText(xml_.Text())) return;
+      } else if (token == Token::kOpen) {
+        Open(xml_.Name());
+      } else {
+        Close(xml_.Name());
       }
     }
   }
-}
+
+ private:
+  static bool IsParagraph(std::string_view name) { return name == "p" || name == "h"; }
+
+  void Open(std::string_view name) {
+    if (IsParagraph(name)) {
+      if (paragraphs_++ > 0) findings_.Break();
+    } else if (name == "automatic-styles" || name == "tracked-changes" || name == "binary-data") {
+      xml_.SkipElement();
+    } else if (name == "table") {
+      (void)findings_.AddText(xml_.PrefixedAttribute("name"));
+      findings_.Break();
+    } else if (name == "table-cell") {
+      ++cells_;
+    } else if (paragraphs_ > 0) {
+      AddBlank(name, findings_);
+    }
+  }
+
+  void Close(std::string_view name) {
+    if (IsParagraph(name)) {
+      --paragraphs_;
+      if (cells_ > 0 && paragraphs_ == 0) {
+        (void)findings_.AddText("\t");
+      } else {
+        findings_.Break();
+      }
+    } else if (name == "table-cell") {
+      --cells_;
+    } else if (name == "table-row") {
+      findings_.Break();
+    }
+  }
+
+  XmlTokenizer xml_;
+  Findings& findings_;
+  int paragraphs_ = 0;  ///< a paragraph may hold others: notes, text in drawings
+  int cells_ = 0;
+};
 
 }  // namespace
 
@@ -81,7 +112,7 @@ void ReadOpenDocument(const Source& source, Findings& findings) {
   }
   const std::unique_ptr<ByteSource> content = zip.Open("content.xml");
   if (content == nullptr) return findings.Fail("damaged");
-  AddContent(*content, findings);
+  ContentReader(*content, findings).Read();
 }
 
 }  // namespace ferrox::extract
