@@ -124,6 +124,23 @@ TEST(AudioTest, Mp3) {
   EXPECT_EQ("Sound", Text(document, "KOVAMDMediaTypes"));
 }
 
+TEST(AudioTest, TagsInEncodingsThatTheyDoNotName) {
+  const auto frames = [](const std::string& title, const std::string& artist, const std::string& album) {
+    const std::string all = Frame("TIT2", '\0' + title) + Frame("TPE1", '\0' + artist) + Frame("TALB", '\0' + album);
+    return std::string("ID3\x03\0\0\0\0\0", 9) + static_cast<char>(all.size()) + all + Mp3().substr(Id3().size());
+  };
+  // "Кино", "Группа крови", "Лучшие песни" in Windows-1251; German that is Latin-1.
+  Json::Value document = Read(&ReadAudio, frames("\xC3\xF0\xF3\xEF\xEF\xE0 \xEA\xF0\xEE\xE2\xE8", "\xCA\xE8\xED\xEE",
+                                                 "\xCB\xF3\xF7\xF8\xE8\xE5 \xEF\xE5\xF1\xED\xE8"));
+  EXPECT_EQ("Группа крови", Text(document, "KOVAMDTitle"));
+  EXPECT_EQ("Кино", Text(document, "KOVAMDAuthors"));
+  document = Read(&ReadAudio, frames("\xDC"
+                                     "ber",
+                                     "Die \xC4rzte", "M\xE4nner"));
+  EXPECT_EQ("Über", Text(document, "KOVAMDTitle"));
+  EXPECT_EQ("Die Ärzte", Text(document, "KOVAMDAuthors"));
+}
+
 TEST(AudioTest, OtherKinds) {
   Json::Value document = Read(&ReadAudio, Flac(), "flac");
   EXPECT_EQ("Ночь", Text(document, "KOVAMDTitle"));

@@ -61,12 +61,27 @@ int64_t LeadingNumber(const std::string& text) {
   return number;
 }
 
-void AddTags(const TagLib::PropertyMap& tags, Findings& findings) {
+/// The encoding of the texts that are no Latin-1 although their tag says so; empty when they may be.
+std::string EncodingOf(const TagLib::PropertyMap& tags) {
+  std::string texts;
   for (const TagField& row : kTextTags) {
     const auto found = tags.find(row.tag);
     if (found == tags.end()) continue;
     for (const TagLib::String& value : found->second) {
-      findings.Append(row.field, WithoutDoubleEncoding(value.to8Bit(true)));
+      if (value.isLatin1() && !value.isAscii() && texts.size() < 4096) texts += value.to8Bit(true) + "\n";
+    }
+  }
+  return TrueEncoding(texts);
+}
+
+void AddTags(const TagLib::PropertyMap& tags, Findings& findings) {
+  const std::string encoding = EncodingOf(tags);
+  for (const TagField& row : kTextTags) {
+    const auto found = tags.find(row.tag);
+    if (found == tags.end()) continue;
+    for (const TagLib::String& value : found->second) {
+      const std::string text = WithoutDoubleEncoding(value.to8Bit(true));
+      findings.Append(row.field, encoding.empty() ? text : InTrueEncoding(text, encoding));
     }
   }
   const auto first = [&](const char* tag) {
