@@ -3,7 +3,7 @@
 
 #include <cstdint>
 #include <cstdlib>
-#include <string_view>
+#include <string>
 
 #include "services/kovacontentextractd/answer.h"
 #include "services/kovacontentextractd/readers/reader.h"
@@ -21,7 +21,7 @@ void Require(bool condition) {
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   Answer answer;
-  const bool taken = ParseAnswer({reinterpret_cast<const char*>(data), size}, answer);
+  const bool taken = ParseAnswer(std::string(reinterpret_cast<const char*>(data), size), answer);
   Require(taken || (answer.fields.empty() && answer.text.empty()));
   Require(answer.text.size() <= Limits().text_bytes && ValidUtf8Prefix(answer.text) == answer.text.size());
   Require(!answer.fields.isMember("KOVAMDPath") && !answer.fields.isMember("KOVAMDTextContent"));

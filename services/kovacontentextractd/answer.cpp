@@ -3,6 +3,8 @@
 #include <algorithm>
 #include <iterator>
 #include <map>
+#include <string_view>
+#include <utility>
 
 #include "common/json_util.h"
 #include "fileindex/elastic/elastic_control.h"
@@ -73,20 +75,21 @@ Json::Value OfType(Type type, const Json::Value& value) {
 
 }  // namespace
 
-bool ParseAnswer(std::string_view bytes, Answer& answer) {
+bool ParseAnswer(std::string bytes, Answer& answer) {
   static const Types types = MakeTypes();
-  const std::string_view json = bytes.substr(0, bytes.find('\0'));
-  const std::string_view text = bytes.substr(std::min(json.size() + 1, bytes.size()));
+  const std::string json = bytes.substr(0, bytes.find('\0'));
+  const std::string_view text = std::string_view(bytes).substr(std::min(json.size() + 1, bytes.size()));
   Json::Value fields;
   if (json.size() > kJsonMaxBytes || ValidUtf8Prefix(json) != json.size()) return false;
-  if (!fromString(fields, std::string(json)) || !fields.isObject()) return false;
+  if (!fromString(fields, json) || !fields.isObject()) return false;
   if (text.size() > kLimits.text_bytes || ValidUtf8Prefix(text) != text.size()) return false;
   for (const auto& [name, type] : types) {
     if (!fields.isMember(name)) continue;
     Json::Value value = OfType(type, fields[name]);
     if (!value.isNull()) answer.fields[name] = std::move(value);
   }
-  answer.text = text;
+  bytes.erase(0, bytes.size() - text.size());
+  answer.text = std::move(bytes);
   return true;
 }
 

@@ -1,7 +1,6 @@
 #pragma once
 
 #include <string>
-#include <string_view>
 
 #include <json/value.h>
 
@@ -18,6 +17,6 @@ struct Answer {
 /// type that the index expects (a number for a text field becomes a text), and neither fields nor text beyond their
 /// limits.
 /// @return false when the bytes are no answer at all.
-bool ParseAnswer(std::string_view bytes, Answer& answer);
+bool ParseAnswer(std::string bytes, Answer& answer);
 
 }  // namespace ferrox::extract

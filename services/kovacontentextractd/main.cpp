@@ -25,11 +25,11 @@ constexpr char kHelp[] =
 /// For the questions about the daemon's state, which come while all workers are busy.
 constexpr unsigned kSpareThreads = 2;
 
-/// What a large text took is given back when it has been sent.
-void KeepLittleMemory() {
+/// What a large text took is kept for the next one while there is work; the pool gives it back at its end.
+void KeepMemoryForTexts() {
   (void)mallopt(M_ARENA_MAX, 2);
-  (void)mallopt(M_MMAP_THRESHOLD, 128 << 10);
-  (void)mallopt(M_TRIM_THRESHOLD, 1 << 20);
+  (void)mallopt(M_MMAP_THRESHOLD, 8 << 20);
+  (void)mallopt(M_TRIM_THRESHOLD, 32 << 20);
 }
 
 /// In the folder FERROX_LIBEXEC, beside this program, or in "../libexec" from there; "" when it is in none.
@@ -82,7 +82,7 @@ int main(int argc, char** argv) {
   if (argc == 2 && strcmp(argv[1], "--version") == 0) return printf("kovacontentextractd %s\n", FERROX_VERSION) < 0;
   if (argc != 1) return fputs(kHelp, stderr) < 0 ? 3 : 2;
   try {
-    KeepLittleMemory();
+    KeepMemoryForTexts();
     Serve();
     return 0;
   } catch (const std::exception& error) {

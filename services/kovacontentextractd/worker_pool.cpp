@@ -1,5 +1,6 @@
 #include "services/kovacontentextractd/worker_pool.h"
 
+#include <malloc.h>
 #include <syslog.h>
 
 #include <algorithm>
@@ -71,7 +72,7 @@ Answer WorkerPool::Read(Program program, const Task& task) {
   for (int attempt = 0; attempt < kAttempts && outcome == Outcome::kNotAsked; ++attempt) {
     Lease lease(*this, program);
     outcome = lease.Worker().Ask(task, options_.longest_read, bytes);
-    if (outcome == Outcome::kAnswered && !ParseAnswer(bytes, answer)) outcome = Outcome::kNonsense;
+    if (outcome == Outcome::kAnswered && !ParseAnswer(std::move(bytes), answer)) outcome = Outcome::kNonsense;
     if (outcome != Outcome::kAnswered) lease.End();
   }
   FERROX_FAIL_IF(outcome == Outcome::kNotAsked, Error::kInternal, "the workers end before they are given a file");
@@ -150,6 +151,7 @@ void WorkerPool::EndIdle() {
       idle_.erase(idle_.begin());
       lock.unlock();
       ended.reset();
+      (void)malloc_trim(0);
       lock.lock();
     }
   }

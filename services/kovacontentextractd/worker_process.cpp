@@ -5,6 +5,7 @@
 #include <signal.h>
 #include <spawn.h>
 #include <sys/socket.h>
+#include <sys/syscall.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -14,7 +15,6 @@
 #include <cstring>
 #include <iterator>
 
-#include "common/clock.h"
 #include "common/error.h"
 #include "common/json_util.h"
 #include "common/log.h"
@@ -31,7 +31,7 @@ using std::chrono::milliseconds;
 constexpr milliseconds kStartMax(10000);
 /// For a process that has closed its socket, or was killed, to be gone.
 constexpr milliseconds kEndMax(2000);
-constexpr milliseconds kEndPoll(1);
+constexpr int kEndPollMs = 1;
 constexpr int kNoStatus = -1;
 
 int MillisecondsUntil(SteadyClock::time_point end) {
@@ -147,10 +147,10 @@ WorkerProcess::Outcome WorkerProcess::Receive(TimePoint end, std::string& answer
   if (header.number != requests_) return Outcome::kNotAsked;  // an earlier file still speaks
   if (header.bytes > kAnswerMaxBytes) return Outcome::kNonsense;
   answer.clear();
+  answer.reserve(header.bytes);
   return ReadExactly(header.bytes, end, answer);
 }
 
-/// Memory grows with what arrives, not with what is announced.
 WorkerProcess::Outcome WorkerProcess::ReadExactly(size_t bytes, TimePoint end, std::string& to) {
   std::array<char, 65536> chunk;
   while (to.size() < bytes) {
@@ -183,6 +183,8 @@ WorkerProcess::Outcome WorkerProcess::HowItEnded() {
 /// The status with which it ended, at most `longest` from now; kNoStatus when it has not. One that a file system holds
 /// in the middle of a read cannot even be killed: it is left alone then.
 int WorkerProcess::Reap(milliseconds longest) {
+  const UniqueFd process(static_cast<int>(syscall(SYS_pidfd_open, pid_, 0)));
+  pollfd state = {process.Get(), POLLIN, 0};
   const auto end = SteadyClock::now() + longest;
   for (;;) {
     int status = 0;
@@ -192,7 +194,7 @@ int WorkerProcess::Reap(milliseconds longest) {
       return ended < 0 ? kNoStatus : status;
     }
     if (SteadyClock::now() > end) return kNoStatus;
-    Clock::Get().SleepFor(kEndPoll);
+    if (poll(&state, 1, process.Valid() ? MillisecondsUntil(end) : kEndPollMs) < 0 && errno != EINTR) return kNoStatus;
   }
 }
 

@@ -78,7 +78,9 @@ Peer PeerOf(int fd) {
 
 std::string Framed(const std::string& body) {
   const auto length = static_cast<uint32_t>(body.size());
-  std::string frame(reinterpret_cast<const char*>(&length), kHeaderBytes);
+  std::string frame;
+  frame.reserve(kHeaderBytes + body.size());
+  frame.append(reinterpret_cast<const char*>(&length), kHeaderBytes);
   frame += body;
   return frame;
 }

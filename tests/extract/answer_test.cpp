@@ -32,7 +32,7 @@ TEST(AnswerTest, OnlyWhatAFilesContentMaySayIsTaken) {
     EXPECT_EQ(row.taken, toString(answer.fields)) << row.json;
   }
   Answer answer;
-  EXPECT_TRUE(ParseAnswer("{}\0text\0more"sv, answer));
+  EXPECT_TRUE(ParseAnswer("{}\0text\0more"s, answer));
   EXPECT_EQ("text\0more"s, answer.text);
   const std::string title(100000, 'x');
   EXPECT_TRUE(ParseAnswer("{\"KOVAMDTitle\":\"" + title + "\"}", answer));

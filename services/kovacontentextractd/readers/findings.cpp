@@ -95,11 +95,16 @@ void Findings::Fail(std::string_view reason) {
   if (failure_.empty()) failure_ = FieldValue(reason);
 }
 
+Json::Value Findings::ToFields() const {
+  Json::Value fields = fields_;
+  if (cut_) fields["_KOVATextCut"] = true;
+  if (!failure_.empty()) fields["_KOVAExtractError"] = failure_;
+  return fields;
+}
+
 Json::Value Findings::ToDocument() const {
-  Json::Value document = fields_;
+  Json::Value document = ToFields();
   if (!text_.empty()) document["KOVAMDTextContent"] = text_;
-  if (cut_) document["_KOVATextCut"] = true;
-  if (!failure_.empty()) document["_KOVAExtractError"] = failure_;
   return document;
 }
 

@@ -56,7 +56,10 @@ class Findings {
   void Fail(std::string_view reason);
 
   bool HasText() const { return !text_.empty(); }
-  /// The document's members: the fields, "KOVAMDTextContent", "_KOVATextCut", "_KOVAExtractError".
+  const std::string& Text() const { return text_; }
+  /// The document's members but the text: the fields, "_KOVATextCut", "_KOVAExtractError".
+  Json::Value ToFields() const;
+  /// All of them: the text is "KOVAMDTextContent".
   Json::Value ToDocument() const;
 
  private:
