@@ -36,8 +36,8 @@ constexpr Format kFormats[] = {
     {"application/vnd.ms-outlook", "old-office", Program::kGeneral, 1},
     {"application/x-ole-storage", "old-office", Program::kGeneral, 1},
     {"application/rtf", "rich-text", Program::kGeneral, 1},
-    {"message/rfc822", "mail", Program::kGeneral, 1},
-    {"application/mbox", "mail", Program::kGeneral, 1},
+    {"message/rfc822", "mail", Program::kMail, 1},
+    {"application/mbox", "mail", Program::kMail, 1},
     {"application/zip", "archive", Program::kGeneral, 1},
     {"application/java-archive", "archive", Program::kGeneral, 1},
     {"application/x-tar", "archive", Program::kGeneral, 1},
@@ -88,8 +88,9 @@ constexpr Format kOtherText = {"", "plain", Program::kGeneral, 1};
 const Format kUnknown = {"", "unknown", Program::kGeneral, 1};
 
 const char* ProgramName(Program program) {
-  static constexpr const char* kNames[kPrograms] = {"kovacontentworker", "kovacontentworker-pdf",
-                                                    "kovacontentworker-photo", "kovacontentworker-video"};
+  static constexpr const char* kNames[kPrograms] = {"kovacontentworker", "kovacontentworker-mail",
+                                                    "kovacontentworker-pdf", "kovacontentworker-photo",
+                                                    "kovacontentworker-video"};
   return kNames[static_cast<int>(program)];
 }
 

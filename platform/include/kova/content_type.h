@@ -7,8 +7,8 @@ namespace kova::content {
 
 /// The program that a reader is part of. Readers that need a library under the GPL, or one that takes long to load, have
 /// one of their own.
-enum class Program { kGeneral, kPdf, kPhoto, kVideo };
-inline constexpr int kPrograms = 4;
+enum class Program { kGeneral, kMail, kPdf, kPhoto, kVideo };
+inline constexpr int kPrograms = 5;
 /// The name of a program, as it is installed.
 const char* ProgramName(Program program);
 

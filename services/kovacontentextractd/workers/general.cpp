@@ -5,7 +5,6 @@
 #include "services/kovacontentextractd/readers/archive.h"
 #include "services/kovacontentextractd/readers/audio.h"
 #include "services/kovacontentextractd/readers/electronic_book.h"
-#include "services/kovacontentextractd/readers/mail.h"
 #include "services/kovacontentextractd/readers/office_open.h"
 #include "services/kovacontentextractd/readers/old_office.h"
 #include "services/kovacontentextractd/readers/open_document.h"
@@ -20,13 +19,12 @@ int main(int argc, char** argv) {
       {"plain", &ReadPlainFile},     {"html", &ReadHtmlFile},        {"xml", &ReadXmlFile},
       {"unknown", &ReadUnknownFile}, {"office", &ReadOfficeOpen},    {"open-document", &ReadOpenDocument},
       {"book", &ReadElectronicBook}, {"old-office", &ReadOldOffice}, {"rich-text", &ReadRichText},
-      {"mail", &ReadMail},           {"archive", &ReadArchive},      {"audio", &ReadAudio},
+      {"archive", &ReadArchive},     {"audio", &ReadAudio},
   };
   const auto prepare = [] {
     PrepareTextReaders();
     PrepareArchive();
     PrepareAudio();
-    PrepareMail();
   };
   return RunWorker({kReaders, std::size(kReaders), prepare}, argc > 1 ? argv[1] : nullptr);
 }
