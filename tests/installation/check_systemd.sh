@@ -6,7 +6,9 @@ build=$1
 system=$(mktemp -d)
 trap 'rm -rf "$system"' EXIT
 
-debootstrap --variant=minbase --include=systemd,systemd-sysv,libjsoncpp25,libsqlite3-0,libzstd1,libuchardet0,libseccomp2,libmagic1 bookworm \
+libraries=libjsoncpp25,libsqlite3-0,libzstd1,libuchardet0,libseccomp2,libmagic1,libzip4,libarchive13,libtag1v5-vanilla
+libraries+=,libgmime-3.0-0,libpoppler-cpp0v5,libexiv2-27,libmediainfo0v5
+debootstrap --variant=minbase --include="systemd,systemd-sysv,$libraries" bookworm \
   "$system" >"$build/systemd-image.log"
 DESTDIR=$system cmake --install "$build" --prefix /usr >/dev/null
 systemctl --root="$system" --quiet enable kovaelasticd.service kovanotifyd.service fileindex-prepare.service
@@ -41,7 +43,13 @@ if [[ ! -e /srv/docs ]]; then
 else
   expect active active active
   finds lantern
+  systemctl stop kovacontentextractd.service
+  echo beacon >/srv/docs/c.txt
+  finds beacon
+  [[ "$(systemctl is-active kovacontentextractd.service)" == active ]]
+  fileindexctl status
   fileindexctl down
+  [[ "$(systemctl is-active kovacontentextractd.service)" == inactive ]]
   expect inactive inactive inactive
   echo "second boot done"
 fi
