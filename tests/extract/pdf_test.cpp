@@ -43,7 +43,7 @@ std::string Sample() {
        "<</Type/Page/Parent 2 0 R/MediaBox[0 0 595 842]/Contents 5 0 R/Resources<</Font<</F " + font + ">>>>>>",
        "<</Type/Page/Parent 2 0 R/MediaBox[0 0 595 842]/Contents 6 0 R/Resources<</Font<</F " + chinese + ">>>>>>",
        Stream("BT /F 12 Tf 50 700 Td (Gr\\374\\337e aus Kiel) Tj ET"), Stream("BT /F 12 Tf 50 700 Td <D6D0CEC4> Tj ET"),
-       "<</Title<FEFF041E0442044704510442>/Author(Anna Berg)/Producer(printer)/CreationDate(D:20240301120000Z)>>",
+       "<</Title<FEFF041E0442044704510442>/Author(Anna Berg)/Producer(printer)/CreationDate(D:20240301140000+02'00')>>",
        Stream(kXmp, "/Type/Metadata/Subtype/XML")},
       "/Info 7 0 R");
 }

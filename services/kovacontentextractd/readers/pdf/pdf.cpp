@@ -1,5 +1,6 @@
 #include "services/kovacontentextractd/readers/pdf/pdf.h"
 
+#include <algorithm>
 #include <exception>
 #include <iterator>
 #include <memory>
@@ -11,6 +12,7 @@
 
 #include "services/kovacontentextractd/readers/mapped_file.h"
 #include "services/kovacontentextractd/readers/pdf/xmp_packet.h"
+#include "services/kovacontentextractd/readers/times.h"
 #include "services/kovacontentextractd/readers/utf8.h"
 
 namespace ferrox::extract {
@@ -42,8 +44,19 @@ std::string Packet(const poppler::ustring& widened) {
   return bytes;
 }
 
-void AddTime(const char* field, time_t seconds, Findings& findings) {
-  if (seconds != static_cast<time_t>(-1)) findings.SetInteger(field, seconds);
+/// A time as PDF writes it, "D:20240301120000+01'00'". The library's own functions return a type whose size is another
+/// one in the library than here on some processors.
+void AddTime(const char* field, std::string text, Findings& findings) {
+  if (text.starts_with("D:")) text.erase(0, 2);
+  const size_t digits = std::min(text.find_first_not_of("0123456789"), text.size());
+  std::string time = text.substr(0, std::min<size_t>(digits, 4));
+  constexpr char kBetween[] = "--T::";
+  for (size_t part = 0; part < 5 && 4 + part * 2 + 2 <= digits; ++part) {
+    time += kBetween[part] + text.substr(4 + part * 2, 2);
+  }
+  std::string zone = text.substr(digits);
+  std::replace(zone.begin(), zone.end(), '\'', ':');
+  if (const auto seconds = ParseTime(time + zone)) findings.SetInteger(field, *seconds);
 }
 
 void AddInformation(const poppler::document& document, Findings& findings) {
@@ -54,8 +67,8 @@ void AddInformation(const poppler::document& document, Findings& findings) {
   findings.Set("KOVAMDKeywords", Utf8(document.get_keywords()));
   findings.Set("KOVAMDCreator", Utf8(document.get_creator()));
   findings.Set("KOVAMDEncodingApplications", Utf8(document.get_producer()));
-  AddTime("KOVAMDContentCreationDate", document.get_creation_date_t(), findings);
-  AddTime("KOVAMDContentModificationDate", document.get_modification_date_t(), findings);
+  AddTime("KOVAMDContentCreationDate", Utf8(document.info_key("CreationDate")), findings);
+  AddTime("KOVAMDContentModificationDate", Utf8(document.info_key("ModDate")), findings);
   findings.SetInteger("KOVAMDNumberOfPages", document.pages());
   int major = 0, minor = 0;
   document.get_pdf_version(&major, &minor);
