@@ -37,7 +37,7 @@ std::string PackageName(ZipContainer& zip) {
   const std::unique_ptr<ByteSource> container = zip.Open("META-INF/container.xml");
   if (container == nullptr) return {};
   XmlTokenizer xml(*container);
-  for (Token token = xml.Next(); token != Token::kEnd && token != Token::kBad; token = xml.Next()) {
+  for (Token token; xml.Next(token);) {
     if (token == Token::kOpen && xml.Name() == "rootfile") return std::string(xml.Attribute("full-path"));
   }
   return {};
@@ -63,7 +63,7 @@ std::vector<std::string> Chapters(ByteSource& package, const std::string& folder
   std::map<std::string, std::string> parts;
   std::vector<std::string> chapters;
   XmlTokenizer xml(package);
-  for (Token token = xml.Next(); token != Token::kEnd && token != Token::kBad; token = xml.Next()) {
+  for (Token token; xml.Next(token);) {
     if (token != Token::kOpen) continue;
     if (xml.Name() == "item" && parts.size() < kPartsMax) {
       parts[std::string(xml.Attribute("id"))] = folder + Unescaped(xml.Attribute("href"));

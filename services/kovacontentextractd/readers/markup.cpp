@@ -4,6 +4,7 @@
 #include <array>
 #include <cstring>
 
+#include "services/kovacontentextractd/readers/code_pages.h"
 #include "services/kovacontentextractd/readers/entities.h"
 #include "services/kovacontentextractd/readers/utf8.h"
 
@@ -122,12 +123,6 @@ bool IsInline(std::string_view name) {
 }
 
 bool IsCell(std::string_view name) { return name == "td" || name == "th" || name == "img" || name == "input"; }
-
-/// Code points that HTML reads as Windows-1252's.
-constexpr std::array<uint16_t, 32> kWindows1252 = {0x20AC, 0x81,   0x201A, 0x0192, 0x201E, 0x2026, 0x2020, 0x2021,
-                                                   0x02C6, 0x2030, 0x0160, 0x2039, 0x0152, 0x8D,   0x017D, 0x8F,
-                                                   0x90,   0x2018, 0x2019, 0x201C, 0x201D, 0x2022, 0x2013, 0x2014,
-                                                   0x02DC, 0x2122, 0x0161, 0x203A, 0x0153, 0x9D,   0x017E, 0x0178};
 
 class Reader {
  public:
@@ -296,7 +291,8 @@ class Reader {
       const auto value = static_cast<uint32_t>(digit ? c - '0' : lower - 'a' + 10);
       code_point = std::min<uint32_t>(code_point * (hex ? 16 : 10) + value, 0x110000);
     }
-    if (html_ && code_point >= 0x80 && code_point < 0xA0) return kWindows1252[code_point - 0x80];
+    if (html_ && code_point >= 0x80 && code_point < 0xA0)
+      return FromWindows1252(static_cast<unsigned char>(code_point));
     return code_point < 0x20 ? ' ' : code_point;
   }
 

@@ -64,7 +64,7 @@ std::vector<Relation> ReadRelations(ZipContainer& zip, std::string_view part) {
   const std::unique_ptr<ByteSource> member = zip.Open(RelationsOf(part));
   if (member == nullptr) return relations;
   XmlTokenizer xml(*member);
-  for (Token token = xml.Next(); token != Token::kEnd && token != Token::kBad; token = xml.Next()) {
+  for (Token token; xml.Next(token);) {
     if (token != Token::kOpen || xml.Name() != "Relationship" || relations.size() == kRelationsMax) continue;
     if (xml.Attribute("TargetMode") == "External") continue;
     const std::string_view type = xml.Attribute("Type");
@@ -93,7 +93,7 @@ bool AddParagraphs(ZipContainer& zip, std::string_view part, Findings& findings)
   if (member == nullptr) return true;
   XmlTokenizer xml(*member);
   bool in_text = false;
-  for (Token token = xml.Next(); token != Token::kEnd && token != Token::kBad; token = xml.Next()) {
+  for (Token token; xml.Next(token);) {
     if (token == Token::kText) {
       if (in_text && !findings.AddText(xml.Text())) return false;
       continue;

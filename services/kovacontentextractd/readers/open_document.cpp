@@ -30,7 +30,7 @@ constexpr PropertyField kMetaFields[] = {
 /// The number of pages stands in an attribute.
 void AddPageCount(ByteSource& meta, Findings& findings) {
   XmlTokenizer xml(meta);
-  for (Token token = xml.Next(); token != Token::kEnd && token != Token::kBad; token = xml.Next()) {
+  for (Token token; xml.Next(token);) {
     if (token != Token::kOpen || xml.Name() != "document-statistic") continue;
     SetProperty({"", "KOVAMDNumberOfPages", PropertyField::kCount}, xml.PrefixedAttribute("page-count"), findings);
   }
@@ -49,7 +49,7 @@ class ContentReader {
   ContentReader(ByteSource& content, Findings& findings) : xml_(content), findings_(findings) {}
 
   void Read() {
-    for (Token token = xml_.Next(); token != Token::kEnd && token != Token::kBad; token = xml_.Next()) {
+    for (Token token; xml_.Next(token);) {
       if (token == Token::kText) {
         if (paragraphs_ > 0 && !findings_.AddText(xml_.Text())) return;
       } else if (token == Token::kOpen) {

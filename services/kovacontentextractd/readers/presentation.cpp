@@ -16,7 +16,7 @@ std::vector<std::string> SlideIds(ZipContainer& zip, const std::string& part) {
   const std::unique_ptr<ByteSource> member = zip.Open(part);
   if (member == nullptr) return ids;
   XmlTokenizer xml(*member);
-  for (Token token = xml.Next(); token != Token::kEnd && token != Token::kBad; token = xml.Next()) {
+  for (Token token; xml.Next(token);) {
     if (token == Token::kOpen && xml.Name() == "sldId" && ids.size() < kSlidesMax) {
       ids.emplace_back(xml.PrefixedAttribute("id"));
     }

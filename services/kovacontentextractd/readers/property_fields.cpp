@@ -41,7 +41,7 @@ void SetProperty(const PropertyField& property, std::string_view value, Findings
 void AddPropertyFields(ByteSource& source, std::span<const PropertyField> fields, Findings& findings) {
   XmlTokenizer xml(source);
   std::string value;
-  for (Token token = xml.Next(); token != Token::kEnd && token != Token::kBad; token = xml.Next()) {
+  for (Token token; xml.Next(token);) {
     if (token == Token::kOpen) value.clear();
     if (token == Token::kText && value.size() < kValueMaxBytes) value += xml.Text();
     if (token != Token::kClose) continue;

@@ -27,7 +27,7 @@ bool ForEachToken(ZipContainer& zip, const std::string& part, Each each) {
   const std::unique_ptr<ByteSource> member = part.empty() ? nullptr : zip.Open(part);
   if (member == nullptr) return true;
   XmlTokenizer xml(*member);
-  for (Token token = xml.Next(); token != Token::kEnd && token != Token::kBad; token = xml.Next()) {
+  for (Token token; xml.Next(token);) {
     if (!each(xml, token)) return false;
   }
   return true;

@@ -197,26 +197,27 @@ XmlTokenizer::Token XmlTokenizer::Next() {
   }
 }
 
+bool XmlTokenizer::Next(Token& token) {
+  token = Next();
+  return token != Token::kEnd && token != Token::kBad;
+}
+
 void XmlTokenizer::SkipElement() {
   const int outside = depth_ - 1;
-  while (depth_ > outside) {
-    const Token token = Next();
-    if (token == Token::kEnd || token == Token::kBad) return;
-  }
+  for (Token token; depth_ > outside && Next(token);) continue;
 }
 
 XmlTokenizer::Token XmlTokenizer::ReadText() {
-  std::string_view rest = Rest();
-  size_t size = std::min({rest.size(), rest.find('<'), rest.find('&')});
-  if (size == rest.size()) {
-    size -= CutOffBytes(rest);
-    if (size == 0) {
-      if (Refill()) return Next();
-      size = rest.size();
-    }
-  }
-  text_ = rest.substr(0, size);
-  begin_ += size;
+  const std::string_view rest = Rest();
+  const size_t size = std::min({rest.size(), rest.find('<'), rest.find('&')});
+  return TakeText(size == rest.size() ? size - CutOffBytes(rest) : size);
+}
+
+/// Hands out that much of the buffer. When that is nothing, there must be more to come; else all that is left.
+XmlTokenizer::Token XmlTokenizer::TakeText(size_t size) {
+  if (size == 0 && Refill()) return Next();
+  text_ = Rest().substr(0, size == 0 ? std::string_view::npos : size);
+  begin_ += text_.size();
   return Token::kText;
 }
 
@@ -249,15 +250,9 @@ XmlTokenizer::Token XmlTokenizer::ReadCData() {
     in_cdata_ = false;
     return Token::kText;
   }
-  size_t size = rest.size() - std::min<size_t>(rest.size(), 2);  // an end may have begun
-  size -= CutOffBytes(rest.substr(0, size));
-  if (size == 0) {
-    if (Refill()) return Next();
-    size = rest.size();
-  }
-  text_ = rest.substr(0, size);
-  begin_ += size;
-  return Token::kText;
+  const std::string_view safe =
+      rest.substr(0, rest.size() - std::min<size_t>(rest.size(), 2));  // an end may have begun
+  return TakeText(safe.size() - CutOffBytes(safe));
 }
 
 XmlTokenizer::Token XmlTokenizer::ReadMarkup() {

@@ -31,6 +31,8 @@ class XmlTokenizer {
   XmlTokenizer& operator=(const XmlTokenizer&) = delete;
 
   Token Next();
+  /// The same for a loop: false at the end, and where it is bad.
+  bool Next(Token& token);
   /// Passes the rest of the element that was opened last, with its end.
   void SkipElement();
 
@@ -61,6 +63,7 @@ class XmlTokenizer {
   void SkipBlanks();
   std::string_view Rest() const { return {buffer_.data() + begin_, end_ - begin_}; }
   Token ReadText();
+  Token TakeText(size_t size);
   Token ReadReference();
   Token ReadCData();
   Token ReadMarkup();

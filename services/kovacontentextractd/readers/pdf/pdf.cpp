@@ -10,10 +10,10 @@
 #include <poppler-page.h>
 #include <string>
 
+#include "services/kovacontentextractd/readers/code_pages.h"
 #include "services/kovacontentextractd/readers/mapped_file.h"
 #include "services/kovacontentextractd/readers/pdf/xmp_packet.h"
 #include "services/kovacontentextractd/readers/times.h"
-#include "services/kovacontentextractd/readers/utf8.h"
 
 namespace ferrox::extract {
 
@@ -23,18 +23,13 @@ using Document = std::unique_ptr<poppler::document>;
 
 void IgnoreComplaint(const std::string&, void*) {}
 
-/// The library's texts are UTF-16; done here, they need no converter of the C library.
 std::string Utf8(const poppler::ustring& text) {
-  std::string out;
-  out.reserve(text.size() * 2);
-  for (size_t i = 0; i < text.size(); ++i) {
-    uint32_t code = text[i];
-    if (code >= 0xD800 && code <= 0xDBFF && i + 1 < text.size() && (text[i + 1] & 0xFC00) == 0xDC00) {
-      code = 0x10000 + ((code & 0x3FF) << 10) + (text[++i] & 0x3FFU);
-    }
-    AppendUtf8(out, code);
+  std::string bytes;
+  for (const uint16_t unit : text) {
+    bytes += static_cast<char>(unit);
+    bytes += static_cast<char>(unit >> 8);
   }
-  return out;
+  return FromUtf16Little(bytes);
 }
 
 /// The library widens each byte of a packet without looking at its encoding.

@@ -37,7 +37,7 @@ void AddXmpPacket(const std::string& packet, Findings& findings) {
   XmlTokenizer xml(source);
   const PropertyField* property = nullptr;
   std::string value;
-  for (Token token = xml.Next(); token != Token::kEnd && token != Token::kBad; token = xml.Next()) {
+  for (Token token; xml.Next(token);) {
     if (token == Token::kText) {
       if (value.size() < (32U << 10)) value += xml.Text();
       continue;
