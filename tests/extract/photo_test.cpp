@@ -116,6 +116,10 @@ TEST(PhotoTest, HeifHasItsExifInAnItem) {
 
 TEST(PhotoTest, DamageIsBorne) {
   EXPECT_EQ("damaged", Text(Read(&ReadPhoto, "no picture", "jpg"), "_KOVAExtractError"));
+  std::string png = WithMetadata(Png());
+  const Json::Value document = Read(&ReadPhoto, png.substr(0, png.size() / 2), "png");
+  EXPECT_EQ("damaged", Text(document, "_KOVAExtractError"));
+  EXPECT_EQ(640, document["KOVAMDPixelWidth"].asInt());
   Abuse(&ReadPhoto, Heif(), "heic");
   Abuse(&ReadPhoto, WithMetadata(Jpeg()), "jpg");
   Abuse(&ReadPhoto, WithMetadata(Png()), "png");

@@ -8,6 +8,7 @@ namespace ferrox::extract {
 namespace {
 
 constexpr long kBlockMaxBytes = 16L << 20;
+constexpr long kReadMaxBytes = 256L << 20;
 
 }  // namespace
 
@@ -18,12 +19,13 @@ AudioStream::AudioStream(const Source& source, uint64_t begin, uint64_t end, std
 }
 
 TagLib::ByteVector AudioStream::readBlock(unsigned long length) {
-  const long left = std::clamp(length_ - at_, 0L, kBlockMaxBytes);
+  const long left = read_ < kReadMaxBytes ? std::clamp(length_ - at_, 0L, kBlockMaxBytes) : 0;
   const auto wanted = static_cast<unsigned>(std::min<unsigned long>(length, static_cast<unsigned long>(left)));
   TagLib::ByteVector block(wanted, '\0');
   const size_t got = wanted > 0 ? file_.ReadAt(begin_ + static_cast<uint64_t>(at_), block.data(), wanted) : 0;
   block.resize(static_cast<unsigned>(got));
   at_ += static_cast<long>(got);
+  read_ += static_cast<long>(got);
   return block;
 }
 

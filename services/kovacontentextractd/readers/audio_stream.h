@@ -7,7 +7,8 @@
 
 namespace ferrox::extract {
 
-/// A part of a file as the tag library wants it: read only, and never more at a time than a tag may have.
+/// A part of a file as the tag library wants it: read only, never more at a time than a tag may have, and ended where
+/// more was read than tags can have: the library searches a whole damaged file for sound.
 class AudioStream : public TagLib::IOStream {
  public:
   AudioStream(const Source& source, uint64_t begin, uint64_t end, std::string name);
@@ -30,6 +31,7 @@ class AudioStream : public TagLib::IOStream {
   uint64_t begin_;
   long length_;  ///< the library counts in long, so that on 32 bits a file ends at 2 GiB
   long at_ = 0;
+  long read_ = 0;  ///< in all
   std::string name_;
 };
 

@@ -215,7 +215,11 @@ void AddPlace(const Fields& fields, Findings& findings) {
 
 void ReadImage(const MappedFile& file, Findings& findings) {
   const auto image = Exiv2::ImageFactory::open(file.Data(), static_cast<long>(file.Size()));
-  image->readMetadata();
+  try {
+    image->readMetadata();
+  } catch (const Exiv2::AnyError&) {
+    findings.Fail("damaged");  // what was read until then holds
+  }
   Fields fields(findings);
   AddPixels(*image, findings);
   // What people wrote with programs counts more than what cameras put there.
