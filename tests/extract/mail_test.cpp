@@ -49,6 +49,18 @@ TEST(MailTest, PeopleSubjectDateTextsAndAttachments) {
   EXPECT_EQ("Grüße aus Kiel\nCafé noir\nzahlen.csv\neins,zwei\nдок.pdf\nforwarded\ninner text\n", Text(document));
 }
 
+TEST(MailTest, HeadersInEncodingsThatTheyDoNotName) {
+  // "Тема письма", "Иван" in Windows-1251; German in Latin-1.
+  Json::Value document = Read(
+      &ReadMail, "Subject: \xD2\xE5\xEC\xE0 \xEF\xE8\xF1\xFC\xEC\xE0\nFrom: \xC8\xE2\xE0\xED <i@example.org>\n\nx");
+  EXPECT_EQ("Тема письма", Text(document, "KOVAMDTitle"));
+  EXPECT_EQ("Иван", Text(document, "KOVAMDAuthors"));
+  document = Read(&ReadMail,
+                  "Subject: Gr\xFC\xDF"
+                  "e\n\nx");
+  EXPECT_EQ("Grüße", Text(document, "KOVAMDTitle"));
+}
+
 TEST(MailTest, BoxOfMessages) {
   const Json::Value document = Read(&ReadMail, Box(), "mbox");
   EXPECT_NE(std::string::npos, Text(document).find("first\none\n")) << Text(document);

@@ -67,6 +67,7 @@ std::string WithMetadata(const std::string& picture) {
   exif["Exif.Photo.FNumber"] = Exiv2::URational(28, 10);
   exif["Exif.Photo.FocalLength"] = Exiv2::URational(35, 1);
   exif["Exif.Photo.ISOSpeedRatings"] = uint16_t(400);
+  exif["Exif.Photo.UserComment"] = "charset=Unicode Море";
   exif["Exif.Photo.Flash"] = uint16_t(1);
   image->iptcData()["Iptc.Application2.City"] = "Paris";
   image->iptcData()["Iptc.Application2.CountryName"] = "France";
@@ -97,6 +98,7 @@ TEST(PhotoTest, WhatCamerasAndPeoplePutIntoPictures) {
     EXPECT_EQ(35, document["KOVAMDFocalLength"].asDouble());
     EXPECT_EQ(400, document["KOVAMDISOSpeed"].asInt());
     EXPECT_EQ(1, document["KOVAMDFlashOnOff"].asInt());
+    EXPECT_EQ("Море", Text(document, "KOVAMDComment"));
     EXPECT_EQ(640, document["KOVAMDPixelWidth"].asInt());
     EXPECT_EQ(480, document["KOVAMDPixelHeight"].asInt());
     EXPECT_EQ("Fête à la plage", Text(document, "KOVAMDTitle"));

@@ -15,8 +15,8 @@ namespace KOVA::CONTENT_EXTRACT {
 ///
 /// Members beside the schema's: "_KOVAStamp" (string; changes when size, mtime, ctime or inode does) always; when the
 /// content was wanted, and of anything but a folder, "_KOVANeedMeta" (true), "_KOVAExtractError" (string; the reason)
-/// where it, or a part of it, could not be read, "_KOVATextEncoding" (string; " (guess)" at its end when the text was too
-/// short to tell), where there was more text than is kept "_KOVATextCut" (true), and where a reader was asked
+/// where it, or a part of it, could not be read, "_KOVATextEncoding" (string; " (guess)" at its end when the text was
+/// too short to tell), where there was more text than is kept "_KOVATextCut" (true), and where a reader was asked
 /// "_KOVAExtractVersion" (its version). A file without readable content still yields the document of its name; formats
 /// that no reader exists for have neither text nor error. The text is at most 1 MiB.
 ///
@@ -30,8 +30,8 @@ void ParseFile(const std::string& path, const Json::Value& config, Json::Value& 
 /// "" when that was not so.
 std::string ExtractionProblem();
 
-/// The version of what reads files of a content type now; 0 when nothing does. A document that has an error, or was made
-/// when there was no reader, and an older version than this is worth another try.
+/// The version of what reads files of a content type now; 0 when nothing does. A document that has an error, or was
+/// made when there was no reader, and an older version than this is worth another try.
 int ExtractVersion(const std::string& content_type);
 
 /// The "_KOVAStamp" that ParseFile gives a file whose `lstat` is `status`: a short text without control characters.

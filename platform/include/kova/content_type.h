@@ -5,8 +5,8 @@
 /// What kind of content a file has, by its name and its first bytes, and who reads it.
 namespace kova::content {
 
-/// The program that a reader is part of. Readers that need a library under the GPL, or one that takes long to load, have
-/// one of their own.
+/// The program that a reader is part of. Readers that need a library under the GPL, or one that takes long to load,
+/// have one of their own.
 enum class Program { kGeneral, kMail, kPdf, kPhoto, kVideo };
 inline constexpr int kPrograms = 5;
 /// The name of a program, as it is installed.

@@ -10,6 +10,7 @@
 #include <map>
 #include <memory>
 #include <mutex>
+#include <vector>
 
 #include "services/kovacontentextractd/readers/utf8.h"
 
@@ -300,6 +301,11 @@ bool Guess(std::string_view bytes, bool cut, DecodedText& decoded) {
 
 }  // namespace
 
+void HoldConverter(const char* from, const char* to) {
+  static auto* held = new std::vector<iconv_t>;  // never freed
+  held->push_back(iconv_open(to, from));
+}
+
 void LoadConverters() {
   static constexpr const char* kInUse[] = {
       "WINDOWS-1250", "WINDOWS-1251", "WINDOWS-1252", "WINDOWS-1253", "WINDOWS-1254", "WINDOWS-1255", "WINDOWS-1256",
@@ -307,8 +313,7 @@ void LoadConverters() {
       "ISO-8859-6",   "ISO-8859-7",   "ISO-8859-8",   "ISO-8859-10",  "ISO-8859-13",  "ISO-8859-15",  "ISO-8859-16",
       "KOI8-U",       "IBM852",       "IBM855",       "IBM866",       "MAC-CYRILLIC", "GB18030",      "CP932",
       "EUC-JP",       "ISO-2022-JP",  "UHC",          "ISO-2022-KR",  "JOHAB",        "BIG5-HKSCS",   "EUC-TW"};
-  // Never closed: a converter that nobody holds is unloaded.
-  for (const char* encoding : kInUse) (void)iconv_open("UTF-8", encoding);
+  for (const char* encoding : kInUse) HoldConverter(encoding, "UTF-8");
 }
 
 bool Decode(std::string_view bytes, bool cut, const std::string& declared, DecodedText& decoded) {

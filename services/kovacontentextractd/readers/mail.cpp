@@ -9,6 +9,7 @@
 
 #include "services/kovacontentextractd/readers/byte_source.h"
 #include "services/kovacontentextractd/readers/encoding.h"
+#include "services/kovacontentextractd/readers/latin1.h"
 #include "services/kovacontentextractd/readers/markup.h"
 
 namespace ferrox::extract {
@@ -27,6 +28,19 @@ struct Unref {
 template <typename Type>
 using Ref = std::unique_ptr<Type, Unref>;
 
+struct FreeOptions {
+  void operator()(GMimeParserOptions* options) const { g_mime_parser_options_free(options); }
+};
+using Options = std::unique_ptr<GMimeParserOptions, FreeOptions>;
+
+/// Bytes outside ASCII in a header are UTF-8, or else taken for Latin-1, which can be undone.
+Options HeaderOptions() {
+  static const char* kFallbacks[] = {"utf-8", "iso-8859-1", nullptr};
+  Options options(g_mime_parser_options_new());
+  g_mime_parser_options_set_fallback_charsets(options.get(), kFallbacks);
+  return options;
+}
+
 std::string_view View(const char* text) { return text != nullptr ? text : std::string_view(); }
 
 /// Reads one message after the other out of a file.
@@ -39,8 +53,9 @@ class MailReader {
     const Ref<GMimeStream> stream(g_mime_stream_fs_new(fd));
     const Ref<GMimeParser> parser(g_mime_parser_new_with_stream(stream.get()));
     g_mime_parser_set_format(parser.get(), is_box_ ? GMIME_FORMAT_MBOX : GMIME_FORMAT_MESSAGE);
+    const Options options = HeaderOptions();
     for (int count = 0; count < kMessagesMax; ++count) {
-      const Ref<GMimeMessage> message(g_mime_parser_construct_message(parser.get(), nullptr));
+      const Ref<GMimeMessage> message(g_mime_parser_construct_message(parser.get(), options.get()));
       if (message == nullptr) {
         if (count == 0) findings_.Fail("damaged");
         return;
@@ -53,11 +68,12 @@ class MailReader {
 
  private:
   void AddHeader(GMimeMessage* message) {
+    encoding_ = TrueEncoding(View(g_mime_message_get_subject(message)));
     AddPeople(message, GMIME_ADDRESS_TYPE_FROM, "KOVAMDAuthors", "KOVAMDAuthorAddresses");
     AddPeople(message, GMIME_ADDRESS_TYPE_TO, "KOVAMDRecipients", "KOVAMDRecipientAddresses");
     AddPeople(message, GMIME_ADDRESS_TYPE_CC, "KOVAMDRecipients", "KOVAMDRecipientAddresses");
     if (is_box_) return;  // what is one message's
-    findings_.Set("KOVAMDTitle", View(g_mime_message_get_subject(message)));
+    findings_.Set("KOVAMDTitle", HeaderText(g_mime_message_get_subject(message)));
     findings_.Set("KOVAMDIdentifier", View(g_mime_message_get_message_id(message)));
     GMimeObject* headers = GMIME_OBJECT(message);
     findings_.Set("KOVAMDEncodingApplications", View(g_mime_object_get_header(headers, "User-Agent")));
@@ -65,6 +81,12 @@ class MailReader {
     findings_.Set("KOVAMDKeywords", View(g_mime_object_get_header(headers, "Keywords")));
     GDateTime* date = g_mime_message_get_date(message);
     if (date != nullptr) findings_.SetInteger("KOVAMDContentCreationDate", g_date_time_to_unix(date));
+  }
+
+  /// A header's text, in the encoding that the message's subject has without saying so.
+  std::string HeaderText(const char* text) const {
+    std::string value(View(text));
+    return encoding_.empty() ? value : InTrueEncoding(std::move(value), encoding_);
   }
 
   void AddPeople(GMimeMessage* message, GMimeAddressType type, const char* names, const char* addresses) {
@@ -75,13 +97,13 @@ class MailReader {
     const int count = list != nullptr && level < 3 ? std::min(internet_address_list_length(list), kAddressesMax) : 0;
     for (int i = 0; i < count; ++i) {
       InternetAddress* address = internet_address_list_get_address(list, i);
-      const std::string_view name = View(internet_address_get_name(address));
+      const std::string name = HeaderText(internet_address_get_name(address));
       if (INTERNET_ADDRESS_IS_GROUP(address)) {
         InternetAddressList* members = internet_address_group_get_members(INTERNET_ADDRESS_GROUP(address));
         AddAddresses(members, names, addresses, level + 1);
       } else if (INTERNET_ADDRESS_IS_MAILBOX(address)) {
         const std::string_view mailbox = View(internet_address_mailbox_get_addr(INTERNET_ADDRESS_MAILBOX(address)));
-        findings_.Append(names, name.empty() ? mailbox : name);
+        findings_.Append(names, name.empty() ? mailbox : std::string_view(name));
         findings_.Append(addresses, mailbox);
       }
     }
@@ -89,7 +111,7 @@ class MailReader {
 
   /// False when the findings take no more.
   bool AddMessageText(GMimeMessage* message, int level) {
-    if (is_box_ || level > 0) AddLine(View(g_mime_message_get_subject(message)));
+    if (is_box_ || level > 0) AddLine(HeaderText(g_mime_message_get_subject(message)));
     return AddObject(g_mime_message_get_mime_part(message), level);
   }
 
@@ -181,11 +203,23 @@ class MailReader {
   bool is_box_;
   int depth_;
   int parts_ = 0;
+  std::string encoding_;  ///< of headers that are bytes outside ASCII and not UTF-8; empty for Latin-1
 };
 
 }  // namespace
 
-void PrepareMail() { g_mime_init(); }
+void PrepareMail() {
+  static const bool once = [] {
+    g_mime_init();
+    // The encodings of headers, by the names that the library has for them.
+    for (const char* encoding : {"ISO-8859-1", "ISO-8859-9", "GB2312", "GBK", "BIG5", "EUC-KR", "KOI8-R", "SHIFT_JIS",
+                                 "TIS-620", "UTF-7", "UTF-16"}) {
+      HoldConverter(encoding, "UTF-8");
+    }
+    return true;
+  }();
+  (void)once;
+}
 
 void ReadMail(const Source& source, Findings& findings) {
   PrepareMail();

@@ -11,6 +11,7 @@
 #include <string>
 
 #include "services/kovacontentextractd/readers/code_pages.h"
+#include "services/kovacontentextractd/readers/encoding.h"
 #include "services/kovacontentextractd/readers/mapped_file.h"
 #include "services/kovacontentextractd/readers/pdf/xmp_packet.h"
 #include "services/kovacontentextractd/readers/times.h"
@@ -127,9 +128,11 @@ void ReadDocument(const char* bytes, size_t size, Findings& findings) {
 }  // namespace
 
 void PreparePdf() {
-  // What was loaded stays loaded as long as a document is open.
+  // What was loaded stays loaded as long as somebody holds it: the converters, and a document.
   static const Document* keeper = nullptr;
   if (keeper != nullptr) return;
+  HoldConverter("UTF-8", "UTF-16");
+  HoldConverter("UTF-16", "UTF-8");
   static const std::string bytes = EastAsianPdf();
   poppler::set_debug_error_function(&IgnoreComplaint, nullptr);
   keeper = new Document(poppler::document::load_from_raw_data(bytes.data(), static_cast<int>(bytes.size())));

@@ -36,7 +36,7 @@ constexpr Row kExifRows[] = {
     {"Exif.Image.XPKeywords", "KOVAMDKeywords", Kind::kShown},
     {"Exif.Image.XPAuthor", "KOVAMDAuthors", Kind::kShown},
     {"Exif.Image.Rating", "KOVAMDStarRating", Kind::kShown},
-    {"Exif.Photo.UserComment", "KOVAMDComment", Kind::kShown},
+    {"Exif.Photo.UserComment", "KOVAMDComment"},
     {"Exif.Photo.ExposureTime", "KOVAMDExposureTimeSeconds", Kind::kNumber},
     {"Exif.Photo.FNumber", "KOVAMDFNumber", Kind::kNumber},
     {"Exif.Photo.FNumber", "KOVAMDAperture", Kind::kShown},
@@ -116,6 +116,8 @@ class Fields {
 /// The items of a value one by one: lists of names, texts in several languages.
 void AddValue(const Row& row, const Exiv2::Value& value, Fields& fields) {
   constexpr long kItemsMax = 1000;
+  const auto* comment = dynamic_cast<const Exiv2::CommentValue*>(&value);
+  if (comment != nullptr) return fields.Add(row.field, comment->comment());
   if (value.typeId() == Exiv2::langAlt) {
     const auto& texts = static_cast<const Exiv2::LangAltValue&>(value);
     return fields.Add(row.field, texts.value_.empty() ? std::string() : texts.value_.begin()->second);
