@@ -1,6 +1,7 @@
 #include "cli/ask.h"
 
 #include <algorithm>
+#include <future>
 
 #include "cli/command.h"
 #include "common/error.h"
@@ -14,8 +15,10 @@ namespace {
 
 using services::RequestResult;
 
-/// A search that must first wait for other work still answers within this.
+/// A command that must first wait for other work still answers within this.
 constexpr std::chrono::seconds kLongestWait(120);
+constexpr std::chrono::seconds kSearchWait(20);
+constexpr std::chrono::seconds kStateWait(5);
 
 struct Daemon {
   const char* name;
@@ -26,6 +29,8 @@ constexpr Daemon kEngine = {"the search engine", kElasticdSocket, Error::kEngine
 constexpr Daemon kIndexDaemon = {"the index daemon", kFileIndexdSocket, Error::kInternal};
 constexpr Daemon kNotificationDaemon = {"the notification daemon", kNotifydSocket, Error::kInternal};
 constexpr Daemon kContentExtraction = {"content extraction", kContentExtractdSocket, Error::kInternal};
+
+constexpr char kNoAnswer[] = "does not answer; see its log, or restart it ('fileindexctl down', 'up')";
 
 Json::Value DataOf(const Daemon& daemon, const std::string& text) {
   Json::Value reply;
@@ -52,10 +57,7 @@ Json::Value Answer(const Daemon& daemon, RequestResult result, const std::string
     throw Failure(std::string(daemon.name) + " does not run here (nothing answers at " + InstancePath(daemon.socket) +
                   "); start it with 'fileindexctl up'" + code);
   }
-  if (result == RequestResult::kNoAnswer) {
-    throw Failure(std::string(daemon.name) + " did not answer; see its log, or restart it ('fileindexctl down', 'up')" +
-                  code);
-  }
+  if (result == RequestResult::kNoAnswer) throw Failure(std::string(daemon.name) + " " + kNoAnswer + code);
   return DataOf(daemon, reply);
 }
 
@@ -68,10 +70,38 @@ RequestResult SendCommand(const Daemon& daemon, const std::string& type, const J
   return Ask(daemon, request, std::string(1, '\0'), reply, longest);
 }
 
-Json::Value CommandIfRunning(const Daemon& daemon, const std::string& type, const Json::Value& data) {
+RequestResult SendToEngine(const std::string& command, const Json::Value& data, std::string& reply,
+                           std::chrono::seconds longest) {
+  Json::Value request;
+  request["command"] = command;
+  request["data"] = data;
+  return Ask(kEngine, request, "", reply, longest);
+}
+
+Json::Value AskEngine(const std::string& command, const Json::Value& data, std::chrono::seconds longest) {
   std::string reply;
-  const RequestResult result = SendCommand(daemon, type, data, reply);
-  return result == RequestResult::kNotRunning ? Json::Value() : Answer(daemon, result, reply);
+  const RequestResult result = SendToEngine(command, data, reply, longest);
+  return Answer(kEngine, result, reply);
+}
+
+DaemonState StateFrom(const Daemon& daemon, RequestResult result, const std::string& reply) try {
+  if (result == RequestResult::kNotRunning) return {};
+  if (result == RequestResult::kNoAnswer) return {Json::Value(), kNoAnswer};
+  return {DataOf(daemon, reply), ""};
+} catch (const Failure& failure) {
+  return {Json::Value(), failure.what()};
+}
+
+DaemonState EngineState() {
+  std::string reply;
+  const RequestResult result = SendToEngine("ping", Json::Value(Json::objectValue), reply, kStateWait);
+  return StateFrom(kEngine, result, reply);
+}
+
+DaemonState StateOf(const Daemon& daemon) {
+  std::string reply;
+  const RequestResult result = SendCommand(daemon, "status", Json::Value(), reply, kStateWait);
+  return StateFrom(daemon, result, reply);
 }
 
 /// @throws Failure also when the daemon's answer comes much too late.
@@ -87,13 +117,10 @@ Json::Value Sync(const Daemon& daemon, Json::Value data, std::chrono::millisecon
 }  // namespace
 
 Json::Value AskEngine(const std::string& command, const Json::Value& data) {
-  Json::Value request;
-  request["command"] = command;
-  request["data"] = data;
-  std::string reply;
-  const RequestResult result = Ask(kEngine, request, "", reply);
-  return Answer(kEngine, result, reply);
+  return AskEngine(command, data, kLongestWait);
 }
+
+Json::Value Search(const Json::Value& data) { return AskEngine("search", data, kSearchWait); }
 
 Json::Value AskIndexDaemon(const std::string& type, const Json::Value& data) {
   std::string reply;
@@ -102,15 +129,22 @@ Json::Value AskIndexDaemon(const std::string& type, const Json::Value& data) {
 }
 
 Json::Value AskIndexDaemonIfRunning(const std::string& type, const Json::Value& data) {
-  return CommandIfRunning(kIndexDaemon, type, data);
+  std::string reply;
+  const RequestResult result = SendCommand(kIndexDaemon, type, data, reply);
+  return result == RequestResult::kNotRunning ? Json::Value() : Answer(kIndexDaemon, result, reply);
 }
 
-Json::Value AskNotificationDaemonIfRunning(const std::string& type, const Json::Value& data) {
-  return CommandIfRunning(kNotificationDaemon, type, data);
-}
-
-Json::Value AskContentExtractionIfRunning(const std::string& type, const Json::Value& data) {
-  return CommandIfRunning(kContentExtraction, type, data);
+InstanceState AskAll() {
+  const auto ask = [](const Daemon& daemon) { return std::async(std::launch::async, &StateOf, std::cref(daemon)); };
+  auto index_daemon = ask(kIndexDaemon);
+  auto notification_daemon = ask(kNotificationDaemon);
+  auto content_extraction = ask(kContentExtraction);
+  InstanceState state;
+  state.engine = EngineState();
+  state.index_daemon = index_daemon.get();
+  state.notification_daemon = notification_daemon.get();
+  state.content_extraction = content_extraction.get();
+  return state;
 }
 
 /// First what the file systems have reported is in the queues, then what is in the queues is in the index.
@@ -128,7 +162,7 @@ void AwaitChanges(const std::string& share, std::chrono::seconds longest) {
   (void)Sync(kIndexDaemon, data, std::max(left, milliseconds(0)));
 }
 
-void RequireEngine() { (void)AskEngine("ping", Json::Value(Json::objectValue)); }
+void RequireEngine() { (void)AskEngine("ping", Json::Value(Json::objectValue), kStateWait); }
 
 void RequireIndexDaemon() { (void)AskIndexDaemon("status", Json::Value()); }
 

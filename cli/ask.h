@@ -10,12 +10,25 @@ namespace ferrox::cli {
 /// Sends one request to a daemon of this instance and returns the reply's "data".
 /// @throws Failure when the daemon does not run or does not answer, or with its own message when it refuses.
 Json::Value AskEngine(const std::string& command, const Json::Value& data);
+Json::Value Search(const Json::Value& data);
 Json::Value AskIndexDaemon(const std::string& type, const Json::Value& data);
 
 /// The same, but null when the daemon does not run.
 Json::Value AskIndexDaemonIfRunning(const std::string& type, const Json::Value& data);
-Json::Value AskNotificationDaemonIfRunning(const std::string& type, const Json::Value& data);
-Json::Value AskContentExtractionIfRunning(const std::string& type, const Json::Value& data);
+
+/// What a daemon says of itself.
+struct DaemonState {
+  Json::Value status;   ///< its reply; null when there is none
+  std::string problem;  ///< why it runs and there is no reply, with the remedy
+};
+struct InstanceState {
+  DaemonState engine;
+  DaemonState index_daemon;
+  DaemonState notification_daemon;
+  DaemonState content_extraction;
+};
+/// Asks all daemons at once and waits for each at most 5 s, so that one that hangs hides nothing of the others.
+InstanceState AskAll();
 
 /// Waits until what was changed before, in a share or ("") in all, is in the index.
 /// @throws Failure, with reason and remedy, when that is not so within the time.

@@ -117,7 +117,7 @@ bool IsFresh(const Arguments& arguments) try {
 int RunSearch(const Arguments& arguments) {
   const Json::Value request = SearchRequest(arguments);
   if (arguments.Has("--fresh") && !IsFresh(arguments)) return kNotFresh;
-  const Json::Value result = AskEngine("search", request);
+  const Json::Value result = Search(request);
   const uint64_t hits = result["hits"].isArray() ? result["hits"].size() : 0;
   if (arguments.Has("--json")) {
     (void)printf("%s\n", ToScriptJson(result).c_str());

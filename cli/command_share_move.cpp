@@ -1,5 +1,3 @@
-#include <sys/stat.h>
-
 #include <algorithm>
 #include <cstdio>
 #include <functional>
@@ -44,11 +42,6 @@ struct Move {
   std::string old_path;
   std::string new_path;
 };
-
-bool Exists(const std::string& path) {
-  struct stat status = {};
-  return lstat(path.c_str(), &status) == 0;
-}
 
 bool HasIndex(const std::string& share) {
   const std::string id = fileindex::elastic::GetFileIndexID(share);

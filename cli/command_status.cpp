@@ -40,11 +40,11 @@ void PrintWork(const Json::Value& share) {
   (void)printf("\n");
 }
 
-void PrintShare(const Json::Value& share, bool changes_noticed) {
+void PrintShare(const Json::Value& share, const std::string& notification_problem) {
   (void)printf("share %s: %s\n", EscapeForTerminal(TextOf(share, "share")).c_str(),
                EscapeForTerminal(TextOf(share, "path")).c_str());
   PrintWork(share);
-  (void)fputs(WatchLines(share, changes_noticed).c_str(), stdout);
+  (void)fputs(WatchLines(share, notification_problem).c_str(), stdout);
   const Json::Value& index = share["index"];
   if (index.isObject()) {
     (void)printf("    index: %s documents, %s, %s\n", Count(UintOf(index, "documents")).c_str(),
@@ -96,28 +96,22 @@ Json::Value RestingShares(const Json::Value& daemon, std::string& problem) try {
   return Json::Value(Json::arrayValue);
 }
 
-/// The engine's "ping" reply, or null when it does not run.
-Json::Value EngineState() {
-  try {
-    return AskEngine("ping", Json::Value(Json::objectValue));
-  } catch (const Failure&) {
-    return Json::Value();
-  }
-}
-
-/// A daemon's "status" reply, or null when it does not run.
-Json::Value StateOf(Json::Value (*ask)(const std::string& type, const Json::Value& data)) {
-  try {
-    return ask("status", Json::Value());
-  } catch (const Failure&) {
-    return Json::Value();  // it does not answer; what the others say is worth showing
-  }
-}
-
 constexpr char kStopped[] = "does not run; start it with 'fileindexctl up'";
 
 std::string EngineText(const Json::Value& engine) {
   return engine.isNull() ? kStopped : "runs, process " + std::to_string(IntOf(engine, "pid"));
+}
+
+/// `text` of its status, or why there is none.
+void PrintDaemon(const char* name, const DaemonState& daemon, const std::string& text) {
+  (void)printf("%s: %s\n", name, daemon.problem.empty() ? text.c_str() : EscapeForTerminal(daemon.problem).c_str());
+}
+
+Json::Value StatusJson(const DaemonState& daemon) {
+  if (daemon.problem.empty()) return daemon.status;
+  Json::Value json;
+  json["problem"] = daemon.problem;
+  return json;
 }
 
 std::string DaemonText(const Json::Value& daemon, bool needed) {
@@ -141,43 +135,55 @@ std::string ContentExtractionText(const Json::Value& daemon) {
   return text;
 }
 
+int ExitCodeOf(const InstanceState& state) {
+  for (const DaemonState* daemon :
+       {&state.engine, &state.index_daemon, &state.notification_daemon, &state.content_extraction}) {
+    if (!daemon->problem.empty()) return kFailure;
+  }
+  return kDone;
+}
+
 }  // namespace
 
 int RunStatus(const Arguments& arguments) {
-  const Json::Value engine = EngineState();
-  Json::Value daemon = AskIndexDaemonIfRunning("status", Json::Value());
-  const Json::Value notification_daemon = StateOf(&AskNotificationDaemonIfRunning);
-  const Json::Value content_extraction = StateOf(&AskContentExtractionIfRunning);
+  InstanceState state = AskAll();
+  Json::Value& daemon = state.index_daemon.status;
+  const Json::Value& notification_daemon = state.notification_daemon.status;
   AddWatches(notification_daemon, daemon);
   std::string problem;
   const Json::Value resting = RestingShares(daemon, problem);
   if (arguments.Has("--json")) {
     Json::Value json;
-    json["engine"] = engine;
-    json["index_daemon"] = daemon;
-    json["notification_daemon"] = notification_daemon;
-    json["content_extraction"] = content_extraction;
+    json["engine"] = StatusJson(state.engine);
+    json["index_daemon"] = StatusJson(state.index_daemon);
+    json["notification_daemon"] = StatusJson(state.notification_daemon);
+    json["content_extraction"] = StatusJson(state.content_extraction);
     json["resting_shares"] = resting;
     if (!problem.empty()) json["problem"] = problem;
     (void)printf("%s\n", ToScriptJson(json).c_str());
-    return kDone;
+    return ExitCodeOf(state);
   }
-  (void)printf("search engine: %s\n", EngineText(engine).c_str());
+  PrintDaemon("search engine", state.engine, EngineText(state.engine.status));
   const bool needed = !resting.empty() || !problem.empty();
-  (void)printf("index daemon: %s\n", DaemonText(daemon, needed).c_str());
+  PrintDaemon("index daemon", state.index_daemon, DaemonText(daemon, needed));
   const bool has_shares = !daemon.isNull() && !daemon["shares"].empty();
-  (void)printf("notification daemon: %s\n", NotificationDaemonText(notification_daemon, needed || has_shares).c_str());
-  (void)printf("content extraction: %s\n", ContentExtractionText(content_extraction).c_str());
+  PrintDaemon("notification daemon", state.notification_daemon,
+              NotificationDaemonText(notification_daemon, needed || has_shares));
+  PrintDaemon("content extraction", state.content_extraction, ContentExtractionText(state.content_extraction.status));
   if (!problem.empty()) (void)printf("indexed folders: %s\n", EscapeForTerminal(problem).c_str());
   if (!daemon.isNull()) {
-    for (const Json::Value& share : daemon["shares"]) PrintShare(share, !notification_daemon.isNull());
+    const bool hangs = !state.notification_daemon.problem.empty();
+    const char* problem_of_watching = hangs ? "does not answer" : notification_daemon.isNull() ? "does not run" : "";
+    for (const Json::Value& share : daemon["shares"]) PrintShare(share, problem_of_watching);
   }
   for (const Json::Value& share : resting) {
     (void)printf("share %s: %s; %s\n", EscapeForTerminal(TextOf(share, "share")).c_str(),
                  FoldersText(UintOf(share, "folders")).c_str(),
-                 share["paused"].asBool() ? "paused until 'fileindexctl share resume'" : "nothing works on it now");
+                 share["paused"].asBool()             ? "paused until 'fileindexctl share resume'"
+                 : state.index_daemon.problem.empty() ? "nothing works on it now"
+                                                      : "what is done with it is not known");
   }
-  return kDone;
+  return ExitCodeOf(state);
 }
 
 }  // namespace ferrox::cli

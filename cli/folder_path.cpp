@@ -17,11 +17,6 @@ namespace ferrox::cli {
 
 namespace {
 
-bool Exists(const std::string& path) {
-  struct stat status = {};
-  return lstat(path.c_str(), &status) == 0;
-}
-
 std::string FromWorkingFolder(const std::string& text) {
   if (text[0] == '/') return text;
   char folder[4096];
@@ -66,6 +61,11 @@ std::string OnDisk(const std::string& text) {
 }
 
 }  // namespace
+
+bool Exists(const std::string& path) {
+  struct stat status = {};
+  return lstat(path.c_str(), &status) == 0;
+}
 
 std::string CleanPath(const std::string& absolute, bool parents) {
   std::vector<std::string> kept;

@@ -8,6 +8,9 @@ class FolderMgr;
 
 namespace ferrox::cli {
 
+/// Whether anything is at a path, a dangling link too.
+bool Exists(const std::string& path);
+
 /// The share path ("/photo/trip") of the folder that a person means by `text`: a share path, or a path on disk, also
 /// one from the working folder. Needless "/" and "." are dropped. A path of `configured` stands for itself, whatever
 /// has become of its folder. Where a text can be read both ways, the way that exists counts, the share path first.

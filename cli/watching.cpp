@@ -49,10 +49,10 @@ void AddWatches(const Json::Value& notification_daemon, Json::Value& index_daemo
   }
 }
 
-std::string WatchLines(const Json::Value& share, bool daemon_runs) {
+std::string WatchLines(const Json::Value& share, const std::string& daemon_problem) {
   constexpr char kNotNoticed[] = "    changes are not noticed, 'fileindexctl index' looks for them";
   const Json::Value& watch = share["watch"];
-  if (!daemon_runs) return std::string(kNotNoticed) + ": the notification daemon does not run\n";
+  if (!daemon_problem.empty()) return std::string(kNotNoticed) + ": the notification daemon " + daemon_problem + "\n";
   if (!watch.isObject() || watch["watches"].empty()) {
     return std::string(kNotNoticed) + ": nobody asked for it; 'fileindexctl folder set' does so again\n";
   }

@@ -15,7 +15,6 @@ namespace {
 
 namespace elastic = fileindex::elastic;
 
-constexpr std::chrono::seconds kFiguresWait(2);
 constexpr char kPathField[] = "KOVAMDPath";
 constexpr char kStampField[] = "_KOVAStamp";
 constexpr char kNeedMetaField[] = "_KOVANeedMeta";
@@ -124,11 +123,11 @@ class Engine : public ShareIndex {
     return Query(std::move(query));
   }
 
-  Json::Value Figures() override {
+  Json::Value Figures(std::chrono::milliseconds longest) override {
     std::string text;
     Json::Value reply;
     const auto result =
-        services::AskLocally(InstancePath(kElasticdSocket), toString(Request("index_stat")), kFiguresWait, text);
+        services::AskLocally(InstancePath(kElasticdSocket), toString(Request("index_stat")), longest, text);
     const bool answered = result == services::RequestResult::kAnswered && fromString(reply, text) && reply.isObject();
     return answered ? reply["data"] : Json::Value();
   }

@@ -460,7 +460,7 @@ bool ShareWorker::AreStill(const ShareFolders& folders) {
   }
 }
 
-Json::Value ShareWorker::Status() {
+Json::Value ShareWorker::Status(std::chrono::milliseconds engine_wait) {
   Json::Value json = status_.ToJson();
   json["share"] = share_;
   json["path"] = root_;
@@ -475,7 +475,7 @@ Json::Value ShareWorker::Status() {
   json["queued"] = Json::UInt64(detached + CountLines(queue_path_));
   const int64_t oldest = OldestChange({queue_path_ + ".tmp", queue_path_});
   if (oldest > 0) json["oldest_change"] = Json::Int64(oldest);
-  json["index"] = index_->Figures();
+  json["index"] = index_->Figures(engine_wait);
   return json;
 }
 

@@ -94,7 +94,9 @@ class ShareWorker {
   /// Carries out what is queued now, if anything. @throws Interrupted; Error when it is to be tried again.
   void RunOnce();
 
-  Json::Value Status();
+  static constexpr std::chrono::milliseconds kEngineWait{2000};
+  /// Waits for the engine's figures at most for so long.
+  Json::Value Status(std::chrono::milliseconds engine_wait = kEngineWait);
 
  private:
   void Loop();

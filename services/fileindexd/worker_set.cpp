@@ -3,6 +3,7 @@
 #include <syslog.h>
 
 #include <algorithm>
+#include <chrono>
 #include <set>
 
 #include "common/error.h"
@@ -75,10 +76,16 @@ void WorkerSet::EndSyncs(const std::string& reason) const {
   for (const auto& [share, worker] : Present()) worker->EndSyncs(reason);
 }
 
-/// The engine, which is asked for each worker, may be slow; commands do not wait for it.
+/// The engine, which is asked for each worker, may be slow; commands do not wait for it. One that hangs costs the wait
+/// once, however many shares there are.
 Json::Value WorkerSet::Status() const {
+  using std::chrono::milliseconds;
+  const auto end = std::chrono::steady_clock::now() + ShareWorker::kEngineWait;
   Json::Value shares(Json::arrayValue);
-  for (const auto& [share, worker] : Present()) shares.append(worker->Status());
+  for (const auto& [share, worker] : Present()) {
+    const auto left = std::chrono::duration_cast<milliseconds>(end - std::chrono::steady_clock::now());
+    shares.append(worker->Status(std::max(left, milliseconds(0))));
+  }
   return shares;
 }
 

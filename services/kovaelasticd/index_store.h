@@ -34,6 +34,7 @@ struct SearchRequest {
   SortKey sort = SortKey::kRelevance;
   bool ascending = false;
   bool snippet = true;
+  size_t ranked_max = 200000;  ///< so many documents, the newest added, are ranked at most for one word
   std::string mark_start = "[";
   std::string mark_end = "]";
 };

@@ -12,9 +12,7 @@ namespace ferrox::engine {
 
 namespace {
 
-/// So many documents, the newest added, are ranked at most for one word.
-constexpr size_t kRankedMax = 200000;
-/// Of those, so many, the best at first sight, are looked at closely.
+/// Of those that are ranked, so many, the best at first sight, are looked at closely.
 constexpr size_t kRankedCloselyMin = 500;
 /// A condition is checked document by document when there are no more of them.
 constexpr int64_t kCheckOneByOneMax = 2000;
@@ -225,8 +223,8 @@ void Searcher::CollectWords(const QueryNode& node, HitCollector& content, HitCol
 }
 
 DocSet Searcher::EvaluateWords(const QueryNode& node, bool ranking) {
-  HitCollector content(kRankedMax);
-  HitCollector meta(kRankedMax);
+  HitCollector content(request_.ranked_max);
+  HitCollector meta(request_.ranked_max);
   CollectWords(node, content, meta);
   DocSet found = content.TakeSet();
   found.UniteWith(meta.Set());
@@ -248,7 +246,7 @@ DocSet Searcher::EvaluateWords(const QueryNode& node, bool ranking) {
 /// The documents worth ranking: all, or the newest added of them.
 std::vector<Searcher::Candidate> Searcher::Candidates(const DocSet& documents, int64_t total, bool& bounded) {
   std::vector<Candidate> candidates;
-  const int64_t skip = std::max<int64_t>(0, total - static_cast<int64_t>(kRankedMax));
+  const int64_t skip = std::max<int64_t>(0, total - static_cast<int64_t>(request_.ranked_max));
   bounded = skip > 0;
   candidates.reserve(static_cast<size_t>(total - skip));
   DocSet by_name;

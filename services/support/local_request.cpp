@@ -14,11 +14,11 @@ class Connection : public kovadaemon::DomainSockConnection {
  public:
   using DomainSockConnection::DomainSockConnection;
 
-  bool WaitForReply(std::chrono::seconds longest) const {
+  bool WaitForReply(std::chrono::milliseconds longest) const {
     pollfd state = {fd_, POLLIN, 0};
     int ready;
     do {
-      ready = poll(&state, 1, static_cast<int>(std::chrono::milliseconds(longest).count()));
+      ready = poll(&state, 1, static_cast<int>(longest.count()));
     } while (ready < 0 && errno == EINTR);
     return ready > 0;
   }
@@ -26,7 +26,7 @@ class Connection : public kovadaemon::DomainSockConnection {
 
 }  // namespace
 
-RequestResult AskLocally(const std::string& socket_path, const std::string& request, std::chrono::seconds longest,
+RequestResult AskLocally(const std::string& socket_path, const std::string& request, std::chrono::milliseconds longest,
                          std::string& reply) {
   Connection connection(socket_path);
   if (!connection.Connect()) return RequestResult::kNotRunning;

@@ -9,7 +9,7 @@ enum class RequestResult { kAnswered, kNotRunning, kNoAnswer };
 
 /// Sends one request to a daemon of this instance and waits for the beginning of its reply, at most `longest`; without
 /// retries. `reply` is filled when it was answered.
-RequestResult AskLocally(const std::string& socket_path, const std::string& request, std::chrono::seconds longest,
+RequestResult AskLocally(const std::string& socket_path, const std::string& request, std::chrono::milliseconds longest,
                          std::string& reply);
 
 }  // namespace ferrox::services

@@ -9,6 +9,7 @@ import struct
 import subprocess
 import tempfile
 import threading
+import time
 import unittest
 
 BIN = os.environ.get("FERROX_BIN", "")
@@ -51,6 +52,11 @@ class FakeDaemon:
         self.socket.shutdown(socket.SHUT_RDWR)
         self.socket.close()
         os.unlink(self.path)
+
+
+class HungDaemon(FakeDaemon):
+    def serve(self):
+        pass
 
 
 def success(data):
@@ -195,6 +201,48 @@ class ToolTest(unittest.TestCase):
         self.assertEqual(["photo"], left["shares"])
         self.assertLessEqual(left["timeout_ms"], 7000)
         self.assertEqual(2, self.run_tool("search", "--fresh=soon", "x").returncode)
+
+    def test_hung_daemons_cost_seconds_and_hide_nothing_of_the_others(self):
+        shares = [{"share": "photo", "path": "/v/photo", "state": "idle", "failures": {}}]
+        answering = {"kovaelasticd": {"ping": success({"pid": 4})}, "kovanotifyd": {"status": success({"pid": 6, "queues": []})},
+                     "fileindexd": {"status": success({"pid": 5, "workers": 2, "paused": False, "shares": shares})},
+                     "kovacontentextractd": {"status": success({"pid": 7})}}
+        places = {"kovaelasticd": ("engine", "search engine"), "fileindexd": ("index_daemon", "index daemon"),
+                  "kovanotifyd": ("notification_daemon", "notification daemon"),
+                  "kovacontentextractd": ("content_extraction", "content extraction")}
+        for hung_names in (["kovanotifyd"], list(places)):
+            daemons = [HungDaemon(self.root, name, {}) if name in hung_names else FakeDaemon(self.root, name, answers)
+                       for name, answers in answering.items()]
+            began = time.monotonic()
+            runs = [subprocess.Popen([TOOL, *words], env=self.env, stdout=subprocess.PIPE, stderr=subprocess.PIPE)
+                    for words in (["status"], ["status", "--json"])]
+            (shown, _), (json_shown, _) = [run.communicate(timeout=60) for run in runs]
+            self.assertLess(time.monotonic() - began, 15)
+            for daemon in daemons:
+                daemon.close()
+            for name, (key, title) in places.items():
+                with self.subTest(hung=hung_names, name=name):
+                    hangs = name in hung_names
+                    line = re.search(f"^{title}: (.*)$", shown.decode(), re.M).group(1)
+                    self.assertRegex(line, "^does not answer; .*'fileindexctl down'" if hangs else "^runs, process ")
+                    self.assertEqual(hangs, "problem" in json.loads(json_shown)[key])
+            self.assertEqual([3, 3], [run.returncode for run in runs])
+            self.assertIn("the notification daemon does not answer" if len(hung_names) == 1 else "is not known", shown.decode())
+
+    def test_search_of_a_hung_engine_ends(self):
+        daemon = HungDaemon(self.root, "kovaelasticd", {})
+        self.addCleanup(daemon.close)
+        done = self.run_tool("search", "x")
+        self.assertEqual(3, done.returncode)
+        self.assertIn(b"the search engine does not answer; see its log, or restart it", done.stderr)
+
+    def test_search_says_when_not_all_was_ranked(self):
+        for bounded in (True, False):
+            daemon = FakeDaemon(self.root, "kovaelasticd", {"search": success(
+                {"total": 300000, "ranking_bounded": bounded, "hits": [{"doc_id": "/v/f", "fields": {}}]})})
+            shown = self.run_tool("search", "x").stdout
+            daemon.close()
+            self.assertEqual(bounded, b"so many match that only a part was ranked" in shown)
 
     def test_status_tells_how_changes_are_noticed(self):
         shares = [{"share": name, "path": "/v/" + name, "queue": "/q/" + name, "state": "idle", "oldest_change": 2000,

@@ -260,6 +260,24 @@ TEST_F(IndexStoreTest, BetterHitsComeFirst) {
   EXPECT_EQ(Paths(Find(*store_, "turbine"), false), "/v/turbine.txt\n/v/about.txt\n/v/mentions.txt");
 }
 
+TEST_F(IndexStoreTest, BoundedRankingSaysSoAndKeepsTheNewestAndThoseByName) {
+  Put("/v/turbine.txt", "a drawing");
+  Put("/v/oldest.txt", "turbine turbine turbine turbine");
+  for (int i = 10; i < 40; ++i) Put("/v/" + std::to_string(i) + ".txt", "turbine");
+  store_->Commit();
+  SearchRequest request;
+  request.limit = 1000;
+  for (const size_t ranked_max : {10U, 31U, 32U}) {
+    request.ranked_max = ranked_max;
+    const SearchReply reply = Find(*store_, "turbine", request);
+    EXPECT_EQ(reply.total, 32);
+    EXPECT_EQ(reply.ranking_bounded, ranked_max < 32) << ranked_max;
+    EXPECT_EQ(reply.hits.size(), std::min<size_t>(32, ranked_max + 1)) << ranked_max;
+    EXPECT_EQ(reply.hits[0].path, "/v/turbine.txt");
+    EXPECT_EQ(Paths(reply).find("/v/oldest.txt") != std::string::npos, ranked_max > 30) << ranked_max;
+  }
+}
+
 TEST_F(IndexStoreTest, ValuesOfAllTypesAreLoadedAsTheyWereStored) {
   Json::Value document = FileDocument("/v/a", "text");
   document["KOVAMDStarRating"] = "5";

@@ -108,7 +108,7 @@ class FakeIndex : public indexd::ShareIndex {
     return page;
   }
 
-  Json::Value Figures() override { return Json::Value(); }
+  Json::Value Figures(std::chrono::milliseconds) override { return Json::Value(); }
 
   std::mutex mutex;
   bool exists = true;

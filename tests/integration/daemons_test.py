@@ -2,6 +2,7 @@
 
 import json
 import os
+import signal
 import time
 import unittest
 
@@ -128,6 +129,21 @@ class DaemonsTest(InstanceTestCase):
         status = self.docs()
         self.assertEqual(10, status["written"] - written)
         self.assertEqual(10060, status["comparison"]["examined"], "all were looked at")
+
+    def test_hung_engine_hides_no_share(self):
+        self.ctl("up")
+        for name in ("a", "b", "c"):
+            self.instance.add_share(name)
+        pid = self.instance.pid("kovaelasticd")
+        os.kill(pid, signal.SIGSTOP)
+        try:
+            done = self.instance.run("status", "--json")
+        finally:
+            os.kill(pid, signal.SIGCONT)
+        status = json.loads(done.stdout)
+        self.assertEqual(3, done.returncode)
+        self.assertIn("does not answer", status["engine"]["problem"])
+        self.assertEqual(["a", "b", "c"], [share["share"] for share in status["index_daemon"]["shares"]])
 
     def test_bad_requests_are_answered(self):
         self.up_with_share()
