@@ -21,6 +21,7 @@
 #include "services/kovacontentextractd/readers/text_files.h"
 #include "services/kovacontentextractd/worker_pool.h"
 #include "services/kovacontentextractd/worker_process.h"
+#include "services/kovacontentextractd/worker_template.h"
 
 namespace {
 
@@ -54,7 +55,12 @@ void InWorker(benchmark::State& state) {
   WorkerPool pool(options);
   const UniqueFd file(open(FileOf(state.range(0)).c_str(), O_RDONLY | O_CLOEXEC));
   for (auto _ : state) {
-    benchmark::DoNotOptimize(pool.Read(kova::content::Program::kGeneral, {file.Get(), "plain", "txt", "a.txt"}));
+    std::string text;
+    const auto sink = [&text](size_t, std::string_view piece) {
+      text += piece;
+      return true;
+    };
+    benchmark::DoNotOptimize(pool.Read(kova::content::Program::kGeneral, {file.Get(), "plain", "txt", "a.txt"}, sink));
   }
 }
 
@@ -72,9 +78,20 @@ void StartOfAWorker(benchmark::State& state) {
   const std::string name = kova::content::ProgramName(static_cast<kova::content::Program>(state.range(0)));
   const std::string program = Dirname(FERROX_WORKER) + "/" + name;
   state.SetLabel(name);
+  WorkerTemplate prepared(program, g_folder);
+  const WorkerProcess first(prepared);
   for (auto _ : state) {
-    const WorkerProcess worker(program, g_folder);
+    const WorkerProcess worker(prepared);
     benchmark::DoNotOptimize(worker.Missing());
+  }
+}
+
+void StartOfATemplate(benchmark::State& state) {
+  const std::string name = kova::content::ProgramName(static_cast<kova::content::Program>(state.range(0)));
+  state.SetLabel(name);
+  for (auto _ : state) {
+    WorkerTemplate prepared(Dirname(FERROX_WORKER) + "/" + name, g_folder);
+    const WorkerProcess worker(prepared);
   }
 }
 
@@ -85,6 +102,7 @@ void Sizes(benchmark::internal::Benchmark* one) {
 BENCHMARK(InProcess)->Apply(Sizes);
 BENCHMARK(InWorker)->Apply(Sizes);
 BENCHMARK(ByParseFile)->Apply(Sizes);
+BENCHMARK(StartOfATemplate)->DenseRange(0, kova::content::kPrograms - 1)->Unit(benchmark::kMicrosecond)->UseRealTime();
 BENCHMARK(StartOfAWorker)->DenseRange(0, kova::content::kPrograms - 1)->Unit(benchmark::kMicrosecond)->UseRealTime();
 
 }  // namespace

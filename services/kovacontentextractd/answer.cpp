@@ -1,15 +1,11 @@
 #include "services/kovacontentextractd/answer.h"
 
-#include <algorithm>
-#include <iterator>
 #include <map>
-#include <string_view>
 #include <utility>
 
 #include "common/json_util.h"
 #include "fileindex/elastic/elastic_control.h"
 #include "fileindex/elastic/fields.h"
-#include "services/kovacontentextractd/readers/reader.h"
 #include "services/kovacontentextractd/readers/utf8.h"
 
 namespace ferrox::extract {
@@ -18,9 +14,7 @@ namespace {
 
 namespace elastic = fileindex::elastic;
 
-constexpr size_t kJsonMaxBytes = 2U << 20;
 constexpr size_t kFieldMaxBytes = 64U << 10;
-constexpr Limits kLimits;
 
 /// What is known without the content, and so is not for it to say.
 constexpr const char* kFacts[] = {elastic::kKOVAMDPath,
@@ -75,21 +69,15 @@ Json::Value OfType(Type type, const Json::Value& value) {
 
 }  // namespace
 
-bool ParseAnswer(std::string bytes, Answer& answer) {
+bool ParseAnswer(const std::string& json, Json::Value& fields) {
   static const Types types = MakeTypes();
-  const std::string json = bytes.substr(0, bytes.find('\0'));
-  const std::string_view text = std::string_view(bytes).substr(std::min(json.size() + 1, bytes.size()));
-  Json::Value fields;
-  if (json.size() > kJsonMaxBytes || ValidUtf8Prefix(json) != json.size()) return false;
-  if (!fromString(fields, json) || !fields.isObject()) return false;
-  if (text.size() > kLimits.text_bytes || ValidUtf8Prefix(text) != text.size()) return false;
+  Json::Value said;
+  if (ValidUtf8Prefix(json) != json.size() || !fromString(said, json) || !said.isObject()) return false;
   for (const auto& [name, type] : types) {
-    if (!fields.isMember(name)) continue;
-    Json::Value value = OfType(type, fields[name]);
-    if (!value.isNull()) answer.fields[name] = std::move(value);
+    if (!said.isMember(name)) continue;
+    Json::Value value = OfType(type, said[name]);
+    if (!value.isNull()) fields[name] = std::move(value);
   }
-  bytes.erase(0, bytes.size() - text.size());
-  answer.text = std::move(bytes);
   return true;
 }
 

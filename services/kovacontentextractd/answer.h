@@ -1,5 +1,6 @@
 #pragma once
 
+#include <cstddef>
 #include <string>
 
 #include <json/value.h>
@@ -9,14 +10,13 @@ namespace ferrox::extract {
 /// What a worker found, as far as it can be believed.
 struct Answer {
   Json::Value fields = Json::Value(Json::objectValue);  ///< metadata, and "_KOVATextCut" and the like
-  std::string text;                                     ///< of the file; UTF-8
+  size_t text_bytes = 0;                                ///< of the file's text, which has been handed on
 };
 
-/// Reads a worker's answer: a JSON object and, behind a zero byte, the file's text. The worker may have been taken over
-/// by what it read, so nothing of it is trusted: only fields that come from a file's content are taken, each of the
-/// type that the index expects (a number for a text field becomes a text), and neither fields nor text beyond their
-/// limits.
-/// @return false when the bytes are no answer at all.
-bool ParseAnswer(std::string bytes, Answer& answer);
+/// Reads the JSON text of a worker's answer. The worker may have been taken over by what it read, so nothing of it is
+/// trusted: only fields that come from a file's content are taken, each of the type that the index expects (a number
+/// for a text field becomes a text), and none beyond its limit.
+/// @return false when the text is no answer at all.
+bool ParseAnswer(const std::string& json, Json::Value& fields);
 
 }  // namespace ferrox::extract

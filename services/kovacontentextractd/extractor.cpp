@@ -85,26 +85,31 @@ Json::Value Extractor::Read(int fd, const std::string& path, std::string& text) 
   if (type != nullptr) document[kTypeField] = type;
   const Format* format = type != nullptr ? FormatOf(type) : &kUnknown;
   if (got == 0 || format == nullptr) return document;
-  Answer answer = ReadAs(*format, task, document);
+  const TextSink sink = [&text](size_t offset, std::string_view piece) {
+    text.resize(offset);
+    text.append(piece);
+    return true;
+  };
+  Answer answer = ReadAs(*format, task, document, sink);
   // What only a look at the bytes of an unknown file tells.
   const Format* second = format == &kUnknown ? FormatOf(answer.fields[kTypeField].asString()) : nullptr;
-  if (second != nullptr && answer.text.empty()) {
+  if (second != nullptr && answer.text_bytes == 0) {
     document[kTypeField] = answer.fields[kTypeField];
-    answer = ReadAs(*second, task, document);
+    answer = ReadAs(*second, task, document, sink);
   }
   for (const auto& name : answer.fields.getMemberNames()) {
     if (!document.isMember(name)) document[name] = answer.fields[name];
   }
-  text = std::move(answer.text);
+  text.resize(answer.text_bytes);
   return document;
 }
 
-Answer Extractor::ReadAs(const Format& format, const Task& task, Json::Value& document) {
+Answer Extractor::ReadAs(const Format& format, const Task& task, Json::Value& document, const TextSink& sink) {
   Task complete = task;
   complete.reader = format.reader;
   if (pool_.Has(format.program)) {
     document["_KOVAExtractVersion"] = format.version;
-    return pool_.Read(format.program, complete);
+    return pool_.Read(format.program, complete, sink);
   }
   document["_KOVAExtractVersion"] = 0;  // so that it is read once the program is there
   Answer answer;

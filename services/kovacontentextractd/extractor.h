@@ -23,7 +23,7 @@ class Extractor {
 
  private:
   Json::Value Read(int fd, const std::string& path, std::string& text);
-  Answer ReadAs(const kova::content::Format& format, const Task& task, Json::Value& document);
+  Answer ReadAs(const kova::content::Format& format, const Task& task, Json::Value& document, const TextSink& sink);
 
   WorkerPool pool_;
 };

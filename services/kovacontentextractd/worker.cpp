@@ -1,17 +1,22 @@
 #include "services/kovacontentextractd/worker.h"
 
 #include <malloc.h>
-#include <sys/socket.h>
+#include <sched.h>
+#include <signal.h>
+#include <sys/mman.h>
 #include <sys/stat.h>
+#include <sys/syscall.h>
 #include <unistd.h>
 
 #include <cerrno>
+#include <cstdlib>
 #include <cstring>
 #include <new>
 #include <string>
 
 #include <json/writer.h>
 
+#include "services/kovacontentextractd/descriptor_passing.h"
 #include "services/kovacontentextractd/sandbox.h"
 #include "services/kovacontentextractd/worker_protocol.h"
 
@@ -50,13 +55,13 @@ std::string ToText(const Json::Value& value) {
   return Json::writeString(builder, value);
 }
 
-/// The JSON text and, behind a zero byte, the file's text as it is: quoting a megabyte costs more than reading it did.
-bool Answer(uint32_t number, const Json::Value& fields, const std::string& text = {}) {
-  std::string begin = ToText(fields);
-  if (!text.empty()) begin += '\0';
-  const AnswerHeader header = {static_cast<uint32_t>(begin.size() + text.size()), number};
-  begin.insert(0, reinterpret_cast<const char*>(&header), sizeof(header));
-  return WriteAll(begin.data(), begin.size()) && WriteAll(text.data(), text.size());
+/// The file's text goes to the region, to which `region` points: through a socket it would be copied twice more.
+bool Answer(char* region, uint32_t number, const Json::Value& fields, const std::string& text = {}) {
+  std::string bytes = ToText(fields);
+  memcpy(region, text.data(), text.size());
+  const AnswerHeader header = {static_cast<uint32_t>(bytes.size()), static_cast<uint32_t>(text.size()), number};
+  bytes.insert(0, reinterpret_cast<const char*>(&header), sizeof(header));
+  return WriteAll(bytes.data(), bytes.size());
 }
 
 struct Request {
@@ -67,20 +72,8 @@ struct Request {
 
 /// The header and the descriptor that comes with it. False when the daemon has hung up, or makes no sense.
 bool ReceiveHeader(RequestHeader& header, int& fd) {
-  alignas(cmsghdr) char control[CMSG_SPACE(sizeof(int))] = {};
-  iovec part = {&header, sizeof(header)};
-  msghdr message = {};
-  message.msg_iov = &part;
-  message.msg_iovlen = 1;
-  message.msg_control = control;
-  message.msg_controllen = sizeof(control);
-  ssize_t got;
-  do {
-    got = recvmsg(kWorkerSocket, &message, MSG_CMSG_CLOEXEC);
-  } while (got < 0 && errno == EINTR);
-  const cmsghdr* ancillary = CMSG_FIRSTHDR(&message);
-  if (got <= 0 || ancillary == nullptr || ancillary->cmsg_type != SCM_RIGHTS) return false;
-  memcpy(&fd, CMSG_DATA(ancillary), sizeof(fd));
+  const ssize_t got = ReceiveWithDescriptors(kWorkerSocket, &header, sizeof(header), &fd, 1);
+  if (got <= 0 || fd < 0) return false;
   return ReadAll(reinterpret_cast<char*>(&header) + got, sizeof(header) - static_cast<size_t>(got));
 }
 
@@ -116,22 +109,55 @@ void KeepMemory() {
   (void)mallopt(M_TRIM_THRESHOLD, 256 << 20);
 }
 
-}  // namespace
-
-int RunWorker(const Worker& worker, const char* empty_folder) try {
-  KeepMemory();
-  worker.prepare();
+/// Reads files for the daemon until that hangs up.
+int ReadFiles(const Worker& worker, const char* empty_folder, int region_fd) {
+  void* const mapped = mmap(nullptr, kRegionBytes, PROT_READ | PROT_WRITE, MAP_SHARED, region_fd, 0);
+  if (mapped == MAP_FAILED) return kExitNoMemory;
+  (void)close(region_fd);
+  char* const region = static_cast<char*>(mapped);
   Json::Value greeting(Json::objectValue);
   greeting["missing"] = Json::Value(Json::arrayValue);
   for (const std::string& piece : CloseSandbox(empty_folder)) greeting["missing"].append(piece);
-  bool connected = Answer(0, greeting);
+  bool connected = Answer(region, 0, greeting);
   for (Request request; connected && ReceiveRequest(request);) {
     Findings findings;
     LimitCpuTime(kCpuSecondsPerFile);
     Read(worker, request, findings);
     LimitCpuTime(0);
     (void)close(request.source.fd);
-    connected = Answer(request.number, findings.ToFields(), findings.Text());
+    connected = Answer(region, request.number, findings.ToFields(), findings.Text());
+  }
+  return 0;
+}
+
+/// Forks. The new process is a child of the daemon and not of this one, so that the daemon learns how it ends.
+pid_t Fork() { return static_cast<pid_t>(syscall(SYS_clone, CLONE_PARENT | SIGCHLD, 0, 0, 0, 0)); }
+
+/// Waits for a worker to be asked for. @return false when the daemon has hung up
+bool ReceiveFork(int& socket, int& region) {
+  char request = 0;
+  int descriptors[2];
+  const ssize_t got = ReceiveWithDescriptors(kWorkerSocket, &request, sizeof(request), descriptors, 2);
+  socket = descriptors[0];
+  region = descriptors[1];
+  return got == 1 && request == kForkRequest && socket >= 0;
+}
+
+}  // namespace
+
+int RunWorker(const Worker& worker, const char* empty_folder) try {
+  KeepMemory();
+  worker.prepare();
+  for (int socket, region; ReceiveFork(socket, region);) {
+    const pid_t pid = Fork();
+    const ForkAnswer answer = {pid < 0 ? -errno : pid};
+    if (answer.pid == 0) {
+      if (dup2(socket, kWorkerSocket) < 0 || close(socket) != 0) return EXIT_FAILURE;
+      return ReadFiles(worker, empty_folder, region);
+    }
+    (void)close(socket);
+    (void)close(region);
+    if (!WriteAll(&answer, sizeof(answer))) return EXIT_FAILURE;
   }
   return 0;
 } catch (const std::bad_alloc&) {

@@ -17,8 +17,9 @@ struct Worker {
   void (*prepare)();
 };
 
-/// Closes the sandbox, says what of it could not be had, and reads files for the daemon until that hangs up.
-/// `empty_folder` becomes the root of the file system where that is allowed. @return the exit status.
+/// Loads what the readers need and then makes workers, as the daemon asks for them, by forks. Each of these closes its
+/// sandbox, says what of it could not be had, and reads files; all until the daemon hangs up. `empty_folder` becomes
+/// the root of a worker's file system where that is allowed. @return the exit status, of each of the processes.
 int RunWorker(const Worker& worker, const char* empty_folder);
 
 }  // namespace ferrox::extract

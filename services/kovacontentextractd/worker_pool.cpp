@@ -33,6 +33,13 @@ const char* Reason(Outcome outcome) {
   }
 }
 
+/// Takes over what of an answer can be believed.
+bool Believe(const RawAnswer& raw, int region, const TextSink& text, Answer& answer) {
+  if (!ParseAnswer(raw.json, answer.fields) || !CopyText(region, raw.text_bytes, text)) return false;
+  answer.text_bytes = raw.text_bytes;
+  return true;
+}
+
 }  // namespace
 
 /// A worker while it is busy; not given back, it ends.
@@ -59,30 +66,38 @@ WorkerPool::~WorkerPool() {
     const std::lock_guard guard(mutex_);
     stopping_ = true;
   }
-  changed_.notify_all();
+  something_to_end_.notify_one();
   ender_.join();
 }
 
 void WorkerPool::Probe(Program program) { const Lease lease(*this, program); }
 
-Answer WorkerPool::Read(Program program, const Task& task) {
-  std::string bytes;
+Answer WorkerPool::Read(Program program, const Task& task, const TextSink& text) {
   Answer answer;
   Outcome outcome = Outcome::kNotAsked;
   for (int attempt = 0; attempt < kAttempts && outcome == Outcome::kNotAsked; ++attempt) {
     Lease lease(*this, program);
-    outcome = lease.Worker().Ask(task, options_.longest_read, bytes);
-    if (outcome == Outcome::kAnswered && !ParseAnswer(std::move(bytes), answer)) outcome = Outcome::kNonsense;
+    RawAnswer raw;
+    outcome = lease.Worker().Ask(task, options_.longest_read, raw);
+    if (outcome == Outcome::kAnswered && !Believe(raw, lease.Worker().Region(), text, answer)) {
+      outcome = Outcome::kNonsense;
+    }
     if (outcome != Outcome::kAnswered) lease.End();
   }
   FERROX_FAIL_IF(outcome == Outcome::kNotAsked, Error::kInternal, "the workers end before they are given a file");
-  const std::lock_guard guard(mutex_);
-  ++files_;
+  Count(outcome == Outcome::kAnswered);
   if (outcome == Outcome::kAnswered) return answer;
-  ++blamed_;
+  // All workers of a template have the same layout of memory: what has broken one shall not learn from it for the next.
+  EndPrepared(program);
   Answer blame;
   blame.fields["_KOVAExtractError"] = Reason(outcome);
   return blame;
+}
+
+void WorkerPool::Count(bool answered) {
+  const std::lock_guard guard(mutex_);
+  ++files_;
+  if (!answered) ++blamed_;
 }
 
 std::unique_ptr<WorkerProcess> WorkerPool::TakeIdle(Program program) {
@@ -97,8 +112,9 @@ std::unique_ptr<WorkerProcess> WorkerPool::Take(Program program) {
   std::unique_ptr<WorkerProcess> given_up;
   {
     std::unique_lock lock(mutex_);
-    changed_.wait(lock, [this] { return busy_ < options_.workers_max; });
+    given_.wait(lock, [this] { return busy_ < options_.workers_max; });
     ++busy_;
+    if (std::exchange(nothing_to_end_, false)) something_to_end_.notify_one();
     while (std::unique_ptr<WorkerProcess> worker = TakeIdle(program)) {
       if (worker->IsReady()) return worker;
     }
@@ -115,8 +131,31 @@ std::unique_ptr<WorkerProcess> WorkerPool::Take(Program program) {
   }
 }
 
+std::unique_ptr<WorkerProcess> WorkerPool::Fork(Program program) {
+  Prepared& prepared = PreparedFor(program);
+  const std::lock_guard guard(prepared.mutex);
+  prepared.used = SteadyClock::now();
+  if (prepared.process == nullptr || !prepared.process->IsReady()) {
+    prepared.process.reset();
+    prepared.process =
+        std::make_unique<WorkerTemplate>(options_.programs[static_cast<size_t>(program)], options_.empty_folder);
+  }
+  try {
+    return std::make_unique<WorkerProcess>(*prepared.process);
+  } catch (...) {
+    prepared.process.reset();
+    throw;
+  }
+}
+
+void WorkerPool::EndPrepared(Program program) {
+  Prepared& prepared = PreparedFor(program);
+  const std::lock_guard guard(prepared.mutex);
+  prepared.process.reset();
+}
+
 std::unique_ptr<WorkerProcess> WorkerPool::Start(Program program) {
-  auto worker = std::make_unique<WorkerProcess>(options_.programs[static_cast<size_t>(program)], options_.empty_folder);
+  std::unique_ptr<WorkerProcess> worker = Fork(program);
   const std::lock_guard guard(mutex_);
   if (missing_ != worker->Missing()) {
     missing_ = worker->Missing();
@@ -135,26 +174,41 @@ void WorkerPool::Give(std::unique_ptr<WorkerProcess> worker, Program program) {
     --busy_;
     if (kept) idle_.push_back({std::move(worker), program, SteadyClock::now()});
   }
-  changed_.notify_all();
+  given_.notify_one();
 }
 
-/// The thread that ends workers which have had nothing to do for long.
+/// The thread that ends what has had nothing to do for long.
 void WorkerPool::EndIdle() {
   std::unique_lock lock(mutex_);
   while (!stopping_) {
-    if (idle_.empty()) {
-      changed_.wait(lock);
-    } else if (const auto due = idle_.front().since + options_.idle_time; SteadyClock::now() < due) {
-      changed_.wait_until(lock, due);
+    std::vector<std::unique_ptr<WorkerProcess>> ended;
+    const auto old = SteadyClock::now() - options_.idle_time;
+    for (; !idle_.empty() && idle_.front().since < old; idle_.erase(idle_.begin())) {
+      ended.push_back(std::move(idle_.front().worker));
+    }
+    lock.unlock();
+    const bool templates_left = EndIdleTemplates(old);
+    if (!ended.empty()) (void)malloc_trim(0);
+    ended.clear();
+    lock.lock();
+    nothing_to_end_ = busy_ == 0 && idle_.empty() && !templates_left;
+    if (nothing_to_end_) {
+      something_to_end_.wait(lock, [this] { return stopping_ || !nothing_to_end_; });
     } else {
-      std::unique_ptr<WorkerProcess> ended = std::move(idle_.front().worker);
-      idle_.erase(idle_.begin());
-      lock.unlock();
-      ended.reset();
-      (void)malloc_trim(0);
-      lock.lock();
+      something_to_end_.wait_for(lock, options_.idle_time / 4, [this] { return stopping_; });
     }
   }
+}
+
+/// @return whether there are others
+bool WorkerPool::EndIdleTemplates(SteadyClock::time_point old) {
+  bool left = false;
+  for (Prepared& prepared : prepared_) {
+    const std::unique_lock guard(prepared.mutex, std::try_to_lock);
+    if (guard.owns_lock() && prepared.used < old) prepared.process.reset();
+    left = left || !guard.owns_lock() || prepared.process != nullptr;
+  }
+  return left;
 }
 
 Json::Value WorkerPool::Status() const {

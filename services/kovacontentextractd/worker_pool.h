@@ -14,13 +14,15 @@
 #include <kova/content_type.h>
 
 #include "services/kovacontentextractd/answer.h"
+#include "services/kovacontentextractd/region.h"
 #include "services/kovacontentextractd/worker_process.h"
+#include "services/kovacontentextractd/worker_template.h"
 
 namespace ferrox::extract {
 
-/// Workers, as many as there are processors, of the programs that are asked for. They are started when they are needed,
+/// Workers, as many as there are processors, of the programs that are asked for. They are made when they are needed,
 /// ended when they have read many files or have had nothing to do for a while, and replaced when a file has killed
-/// them.
+/// them. So is what they are made of.
 class WorkerPool {
  public:
   struct Options {
@@ -43,9 +45,9 @@ class WorkerPool {
   bool Has(kova::content::Program program) const { return !options_.programs[static_cast<size_t>(program)].empty(); }
 
   /// Has a file read; waits for a free worker, then at most for the longest read. From any thread. A file that kills
-  /// its worker, keeps it too long or makes it lie has only "_KOVAExtractError".
+  /// its worker, keeps it too long or makes it lie has only "_KOVAExtractError", whatever `text` was handed before.
   /// @throws Error kInternal when no worker can be started.
-  Answer Read(kova::content::Program program, const Task& task);
+  Answer Read(kova::content::Program program, const Task& task, const TextSink& text);
 
   /// "workers" and "workers_max", "missing" (what the sandbox lacks), "files" and "blamed" since the daemon's start.
   Json::Value Status() const;
@@ -58,16 +60,31 @@ class WorkerPool {
     SteadyClock::time_point since;
   };
 
+  /// What makes the workers of a program; none when none was needed for long.
+  struct Prepared {
+    std::mutex mutex;
+    std::unique_ptr<WorkerTemplate> process;
+    SteadyClock::time_point used;
+  };
+
   class Lease;
   std::unique_ptr<WorkerProcess> TakeIdle(kova::content::Program program);
   std::unique_ptr<WorkerProcess> Take(kova::content::Program program);
   void Give(std::unique_ptr<WorkerProcess> worker, kova::content::Program program);
   std::unique_ptr<WorkerProcess> Start(kova::content::Program program);
+  std::unique_ptr<WorkerProcess> Fork(kova::content::Program program);
+  Prepared& PreparedFor(kova::content::Program program) { return prepared_[static_cast<size_t>(program)]; }
+  void EndPrepared(kova::content::Program program);
   void EndIdle();
+  bool EndIdleTemplates(SteadyClock::time_point old);
+  void Count(bool answered);
 
   const Options options_;
+  std::array<Prepared, kova::content::kPrograms> prepared_;
   mutable std::mutex mutex_;
-  std::condition_variable changed_;
+  std::condition_variable given_;  ///< a worker, back to the pool
+  std::condition_variable something_to_end_;
+  bool nothing_to_end_ = false;
   std::vector<Idle> idle_;  ///< the longest idle first
   unsigned busy_ = 0;
   uint64_t files_ = 0;

@@ -1,15 +1,16 @@
 #pragma once
 
-#include <sys/types.h>
-
 #include <chrono>
 #include <string>
 
 #include <json/value.h>
 
 #include "common/unique_fd.h"
+#include "services/kovacontentextractd/child_process.h"
 
 namespace ferrox::extract {
+
+class WorkerTemplate;
 
 /// One file to be read by a worker.
 struct Task {
@@ -19,22 +20,26 @@ struct Task {
   std::string name;
 };
 
-/// A worker program that runs. It may be at the mercy of the file that it reads.
+/// What a worker says, of which nothing is to be believed.
+struct RawAnswer {
+  std::string json;
+  size_t text_bytes = 0;  ///< of the text in its region
+};
+
+/// A worker that runs. It may be at the mercy of the file that it reads.
 class WorkerProcess {
  public:
-  /// Starts the program and waits until it has closed its sandbox.
-  /// @throws Error kInternal with a sentence when it cannot be started.
-  WorkerProcess(const std::string& program, const std::string& empty_folder);
-  WorkerProcess(const WorkerProcess&) = delete;
-  WorkerProcess& operator=(const WorkerProcess&) = delete;
-  /// Ends it at once.
-  ~WorkerProcess();
+  /// Has the template make one, and waits until it has closed its sandbox.
+  /// @throws Error kInternal with a sentence when that fails.
+  explicit WorkerProcess(WorkerTemplate& prepared);
 
   /// The pieces of the sandbox that this kernel lacks: an array of texts.
   const Json::Value& Missing() const { return missing_; }
   /// Whether it lives and waits for a file.
   bool IsReady() const;
   unsigned FilesRead() const { return requests_; }
+  /// The memory that it shares with this process: a file.
+  int Region() const { return region_.Get(); }
 
   enum class Outcome {
     kAnswered,
@@ -45,21 +50,19 @@ class WorkerProcess {
     kNonsense,  ///< it sent what is no frame
   };
   /// Has it read a file. Unless it answered, it has ended.
-  Outcome Ask(const Task& task, std::chrono::milliseconds longest, std::string& answer);
+  Outcome Ask(const Task& task, std::chrono::milliseconds longest, RawAnswer& answer);
 
  private:
   using TimePoint = std::chrono::steady_clock::time_point;
 
   bool Send(const Task& task);
-  Outcome Receive(TimePoint end, std::string& answer);
-  Outcome ReadExactly(size_t bytes, TimePoint end, std::string& to);
-  void Start(const std::string& program, const std::string& empty_folder);
+  Outcome Receive(TimePoint end, RawAnswer& answer);
+  Outcome ReadExactly(void* to, size_t bytes, TimePoint end);
   Outcome HowItEnded();
-  void End();
-  int Reap(std::chrono::milliseconds longest);
 
-  pid_t pid_ = -1;
   UniqueFd socket_;
+  UniqueFd region_;
+  ChildProcess process_;
   Json::Value missing_ = Json::Value(Json::arrayValue);
   uint32_t requests_ = 0;
 };

@@ -2,12 +2,14 @@
 
 #include <cstdint>
 
-/// What daemon and worker say to each other on the worker's descriptor 3 (docs/formats/extract.md).
+/// What daemon, worker and template say to each other on the descriptor 3 of the latter (docs/formats/extract.md).
 namespace ferrox::extract {
 
 inline constexpr int kWorkerSocket = 3;
-/// The largest answer; what is announced beyond it is hostile.
-inline constexpr uint32_t kAnswerMaxBytes = 4U << 20;
+/// The largest JSON text of an answer; what is announced beyond it is hostile.
+inline constexpr uint32_t kAnswerMaxBytes = 2U << 20;
+/// The memory that a worker shares with the daemon. Its pages exist once they are written.
+inline constexpr uint32_t kRegionBytes = 16U << 20;
 
 /// A request: this, sent together with the descriptor of the file, then the three texts one after the other.
 struct RequestHeader {
@@ -18,10 +20,17 @@ struct RequestHeader {
   uint32_t number;  ///< the first request of a worker is 1
 };
 
-/// An answer: this, then the JSON text and, behind a zero byte, the file's text. The greeting answers request 0.
+/// An answer: this, then the JSON text. The greeting answers request 0.
 struct AnswerHeader {
-  uint32_t bytes;
-  uint32_t number;  ///< of the request, so that no answer is taken for another file's
+  uint32_t json_bytes;
+  uint32_t text_bytes;  ///< of the file's text, which lies at the beginning of the region
+  uint32_t number;      ///< of the request, so that no answer is taken for another file's
+};
+
+/// To a template, with the descriptors of the worker's socket and region. It answers with a ForkAnswer.
+inline constexpr char kForkRequest = 'w';
+struct ForkAnswer {
+  int32_t pid;  ///< of the new worker, which is a child of the daemon's; below 0: the error number why there is none
 };
 
 /// The exit status of a worker that could get no more memory.

@@ -61,8 +61,8 @@ void Devour(const Source&, Findings& findings) {
   findings.AddText(std::to_string(eaten.size()));
 }
 
-void Announce(uint32_t bytes) {
-  const AnswerHeader header = {bytes, g_number};
+void Announce(uint32_t json_bytes, uint32_t text_bytes = 0) {
+  const AnswerHeader header = {json_bytes, text_bytes, g_number};
   (void)!write(kWorkerSocket, &header, sizeof(header));
 }
 
@@ -79,6 +79,11 @@ void AnswerBytes(const Source& source, Findings&) {
   (void)!pread(source.fd, bytes.data(), bytes.size(), 0);
   Announce(static_cast<uint32_t>(bytes.size()));
   (void)!write(kWorkerSocket, bytes.data(), bytes.size());
+}
+
+void AnnounceLongText(const Source&, Findings&) {
+  Announce(2, UINT32_MAX);
+  (void)!write(kWorkerSocket, "{}", 2);
 }
 
 void AnswerTwice(const Source&, Findings& findings) {
@@ -136,6 +141,7 @@ int main(int argc, char** argv) {
       {"announce", &Counted<AnnounceTooMuch>},
       {"babble", &Counted<BabbleForEver>},
       {"bytes", &Counted<AnswerBytes>},
+      {"long text", &Counted<AnnounceLongText>},
       {"twice", &Counted<AnswerTwice>},
       {"escape", &Counted<TryToEscape>},
   };

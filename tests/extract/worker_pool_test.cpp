@@ -34,10 +34,21 @@ WorkerPool::Options TestOptions(unsigned workers = 1) {
 
 class WorkerPoolTest : public testing::Test {
  protected:
-  Answer Read(WorkerPool& pool, const std::string& reader, const std::string& content = "content") {
+  struct Result : Answer {
+    std::string text;
+  };
+  Result Read(WorkerPool& pool, const std::string& reader, const std::string& content = "content") {
     WriteFile(dir_ / "file", content);
     const UniqueFd file(open((dir_ / "file").c_str(), O_RDONLY | O_CLOEXEC));
-    return pool.Read(Program::kGeneral, {file.Get(), reader, "txt", "file.txt"});
+    Result result;
+    const auto sink = [&result](size_t offset, std::string_view piece) {
+      result.text.resize(offset);
+      result.text.append(piece);
+      return true;
+    };
+    static_cast<Answer&>(result) = pool.Read(Program::kGeneral, {file.Get(), reader, "txt", "file.txt"}, sink);
+    EXPECT_EQ(result.text_bytes, result.fields.isMember("_KOVAExtractError") ? 0 : result.text.size());
+    return result;
   }
 
   TempDir dir_;
@@ -54,7 +65,7 @@ int64_t ResidentKiB() {
 
 TEST_F(WorkerPoolTest, TheSandboxHolds) {
   WorkerPool pool(TestOptions());
-  const Answer answer = Read(pool, "escape");
+  const Result answer = Read(pool, "escape");
   EXPECT_EQ("tried", answer.text);
   EXPECT_EQ("", answer.fields["KOVAMDComment"].asString()) << "these worked";
   EXPECT_EQ(Json::arrayValue, pool.Status()["missing"].type());
@@ -76,12 +87,13 @@ TEST_F(WorkerPoolTest, EachBadFileIsBlamedOnceAndTheNextIsRead) {
       {"bytes", "not JSON", "confused the reader"},
       {"bytes", "[1]", "confused the reader"},
       {"bytes", "{\"KOVAMDTitle\":\"x", "confused the reader"},
+      {"long text", "", "confused the reader"},
   };
   uint64_t read = 0;
   for (const auto& row : rows) {
     if (extract::kSanitized && row.reader == std::string("devour")) continue;
     EXPECT_EQ(row.reason, Read(pool, row.reader, row.content).fields["_KOVAExtractError"].asString()) << row.reader;
-    const Answer next = Read(pool, "count");
+    const Result next = Read(pool, "count");
     EXPECT_FALSE(next.fields.isMember("_KOVAExtractError")) << "after " << row.reader;
     EXPECT_FALSE(next.text.empty()) << "after " << row.reader;
     read += 2;
@@ -121,7 +133,7 @@ TEST_F(WorkerPoolTest, WorkersAreReplacedInTime) {
 
 TEST_F(WorkerPoolTest, AThousandBadFilesLeaveNothingBehind) {
   WorkerPool pool(TestOptions(4));
-  const std::string content = "{}" + std::string(1, '\0') + std::string(900000, 'x');
+  const std::string content = "{\"KOVAMDTitle\":\"" + std::string(900000, 'x') + "\"}";
   const auto round = [&](int files) {
     std::atomic<int> left = files, blamed = 0;
     std::vector<std::thread> threads;
@@ -130,7 +142,8 @@ TEST_F(WorkerPoolTest, AThousandBadFilesLeaveNothingBehind) {
         const UniqueFd file(open((dir_ / "file").c_str(), O_RDONLY | O_CLOEXEC));
         constexpr const char* kReaders[] = {"crash", "bytes", "announce", "babble", "be killed"};
         for (int i; (i = --left) >= 0;) {
-          const Answer answer = pool.Read(Program::kGeneral, {file.Get(), kReaders[i % 5], "", "x"});
+          const auto drop = [](size_t, std::string_view) { return true; };
+          const Answer answer = pool.Read(Program::kGeneral, {file.Get(), kReaders[i % 5], "", "x"}, drop);
           blamed += answer.fields.isMember("_KOVAExtractError") ? 1 : 0;
         }
       });

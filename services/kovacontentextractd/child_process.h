@@ -1,0 +1,29 @@
+#pragma once
+
+#include <sys/types.h>
+
+#include <chrono>
+#include <optional>
+
+namespace ferrox::extract {
+
+/// A child of this process, ended at the latest with this object.
+class ChildProcess {
+ public:
+  explicit ChildProcess(pid_t pid = -1) : pid_(pid) {}
+  ChildProcess(const ChildProcess&) = delete;
+  ChildProcess& operator=(const ChildProcess&) = delete;
+  ~ChildProcess() { End(); }
+
+  /// Takes over a child; only when there was none.
+  void Take(pid_t pid) { pid_ = pid; }
+  /// Ends it at once, and waits until it is gone.
+  void End();
+  /// The status with which it ended, as soon as it has, at most `longest` from now; nothing when it has not.
+  std::optional<int> Wait(std::chrono::milliseconds longest);
+
+ private:
+  pid_t pid_;
+};
+
+}  // namespace ferrox::extract

@@ -1,0 +1,53 @@
+#include "services/kovacontentextractd/region.h"
+
+#include <fcntl.h>
+#include <sys/mman.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <array>
+#include <cerrno>
+#include <cstring>
+
+#include "services/kovacontentextractd/readers/reader.h"
+#include "services/kovacontentextractd/readers/utf8.h"
+#include "services/kovacontentextractd/worker_protocol.h"
+
+namespace ferrox::extract {
+
+namespace {
+
+constexpr unsigned kNeverExecuted = 8;  // MFD_NOEXEC_SEAL, of Linux 6.3
+constexpr size_t kCharacterMaxBytes = 4;
+
+}  // namespace
+
+UniqueFd MakeRegion() {
+  constexpr char kName[] = "kovacontentextractd";
+  UniqueFd region(memfd_create(kName, MFD_CLOEXEC | MFD_ALLOW_SEALING | kNeverExecuted));
+  if (!region.Valid() && errno == EINVAL) region.Reset(memfd_create(kName, MFD_CLOEXEC | MFD_ALLOW_SEALING));
+  const bool made = region.Valid() && ftruncate(region.Get(), kRegionBytes) == 0 &&
+                    fcntl(region.Get(), F_ADD_SEALS, F_SEAL_GROW | F_SEAL_SHRINK | F_SEAL_SEAL) == 0;
+  return made ? std::move(region) : UniqueFd();
+}
+
+bool CopyText(int region, size_t bytes, const TextSink& sink) {
+  if (bytes > Limits().text_bytes) return false;
+  std::array<char, 65536> buffer;
+  size_t read = 0, kept = 0;  // of the text; of the buffer, the beginning of a character whose end comes next
+  while (read < bytes) {
+    const size_t wanted = std::min(bytes - read, buffer.size() - kept);
+    const ssize_t got = pread(region, buffer.data() + kept, wanted, static_cast<off_t>(read));
+    if (got <= 0) return false;
+    const std::string_view copied(buffer.data(), kept + static_cast<size_t>(got));
+    const size_t valid = ValidUtf8Prefix(copied);
+    if (valid > 0 && !sink(read - kept, copied.substr(0, valid))) return false;
+    read += static_cast<size_t>(got);
+    kept = copied.size() - valid;
+    if (kept >= kCharacterMaxBytes) return false;
+    memmove(buffer.data(), buffer.data() + valid, kept);
+  }
+  return kept == 0;
+}
+
+}  // namespace ferrox::extract

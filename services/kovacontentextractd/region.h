@@ -1,0 +1,23 @@
+#pragma once
+
+#include <cstddef>
+#include <functional>
+#include <string_view>
+
+#include "common/unique_fd.h"
+
+namespace ferrox::extract {
+
+/// Takes a piece of a text that begins at byte `offset` of it. @return false when it can take no more
+using TextSink = std::function<bool(size_t offset, std::string_view piece)>;
+
+/// Makes the memory that a worker shares with the daemon: kRegionBytes, whose size nobody can change. Not valid, with
+/// errno, when there is none.
+UniqueFd MakeRegion();
+
+/// Hands on the text at the beginning of a worker's region. The worker may write there at any time, so the text is
+/// copied first, and what has been copied is checked.
+/// @return false when it is longer than a text may be, or no UTF-8; the sink may have taken pieces of it then
+bool CopyText(int region, size_t bytes, const TextSink& sink);
+
+}  // namespace ferrox::extract
