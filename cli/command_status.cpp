@@ -132,6 +132,10 @@ std::string ContentExtractionText(const Json::Value& daemon) {
     if (piece.isString())
       text += "\n    the workers lack a protection on this system: " + EscapeForTerminal(piece.asString());
   }
+  for (const Json::Value& program : daemon["not_installed"]) {
+    if (program.isString())
+      text += "\n    not installed: " + EscapeForTerminal(program.asString()) + "; what it reads is found by name only";
+  }
   return text;
 }
 

@@ -1,6 +1,5 @@
 #include <iterator>
 
-#include <kova/content_extract.h>
 #include <kova/content_type.h>
 
 namespace kova::content {
@@ -103,8 +102,3 @@ const Format* FormatOf(std::string_view type) {
 }
 
 }  // namespace kova::content
-
-int KOVA::CONTENT_EXTRACT::ExtractVersion(const std::string& content_type) {
-  const kova::content::Format* format = kova::content::FormatOf(content_type);
-  return format != nullptr ? format->version : 0;
-}

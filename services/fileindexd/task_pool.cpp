@@ -43,7 +43,7 @@ void TaskPool::Work() {
       failure = std::current_exception();
     }
     job.task = nullptr;
-    job.group->Finish(failure);
+    job.group->Finish(std::move(failure));
   }
 }
 

@@ -1,13 +1,9 @@
 #include <malloc.h>
-#include <sys/stat.h>
-#include <unistd.h>
 
 #include <cstdio>
-#include <cstdlib>
 #include <cstring>
 
 #include "common/error.h"
-#include "common/file_util.h"
 #include "common/paths.h"
 #include "services/kovacontentextractd/extractor.h"
 #include "services/support/daemon.h"
@@ -32,29 +28,15 @@ void KeepMemoryForTexts() {
   (void)mallopt(M_TRIM_THRESHOLD, 32 << 20);
 }
 
-/// In the folder FERROX_LIBEXEC, beside this program, or in "../libexec" from there; "" when it is in none.
-std::string FindWorker(const std::string& name) {
-  char self[4096] = {};
-  const ssize_t length = readlink("/proc/self/exe", self, sizeof(self) - 1);
-  const std::string own = length > 0 ? Dirname(std::string(self, static_cast<size_t>(length))) : "";
-  const char* given = secure_getenv("FERROX_LIBEXEC");
-  for (const std::string& folder : {std::string(given != nullptr ? given : ""), own, Dirname(own) + "/libexec"}) {
-    struct stat info = {};
-    const std::string path = folder + "/" + name;
-    if (!folder.empty() && stat(path.c_str(), &info) == 0 && S_ISREG(info.st_mode)) return path;
-  }
-  return {};
-}
-
 extract::WorkerPool::Options PoolOptions() {
-  extract::WorkerPool::Options options;
-  for (int i = 0; i < kova::content::kPrograms; ++i) {
-    options.programs[static_cast<size_t>(i)] =
-        FindWorker(kova::content::ProgramName(static_cast<kova::content::Program>(i)));
-  }
-  if (options.programs[0].empty()) {
-    throw Error(Error::kInternal, std::string(kova::content::ProgramName(kova::content::Program::kGeneral)) +
+  using namespace kova::content;
+  if (ProgramFolder().empty()) {
+    throw Error(Error::kInternal, std::string(ProgramName(Program::kGeneral)) +
                                       " is not installed beside this program; set FERROX_LIBEXEC to its folder");
+  }
+  extract::WorkerPool::Options options;
+  for (int i = 0; i < kPrograms; ++i) {
+    options.programs[static_cast<size_t>(i)] = ProgramFolder() + "/" + ProgramName(static_cast<Program>(i));
   }
   options.empty_folder = InstancePath("/var/run/kovacontentextractd.empty");
   (void)services::MakeFolders(options.empty_folder, 0555);

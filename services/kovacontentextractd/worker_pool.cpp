@@ -2,6 +2,7 @@
 
 #include <malloc.h>
 #include <syslog.h>
+#include <unistd.h>
 
 #include <algorithm>
 #include <utility>
@@ -71,6 +72,10 @@ WorkerPool::~WorkerPool() {
 }
 
 void WorkerPool::Probe(Program program) { const Lease lease(*this, program); }
+
+bool WorkerPool::Has(Program program) const {
+  return access(options_.programs[static_cast<size_t>(program)].c_str(), X_OK) == 0;
+}
 
 Answer WorkerPool::Read(Program program, const Task& task, const TextSink& text) {
   Answer answer;
@@ -217,6 +222,11 @@ Json::Value WorkerPool::Status() const {
   status["workers"] = Json::UInt64(busy_ + idle_.size());
   status["workers_max"] = options_.workers_max;
   status["missing"] = missing_;
+  status["not_installed"] = Json::Value(Json::arrayValue);
+  for (int i = 0; i < kova::content::kPrograms; ++i) {
+    const auto program = static_cast<Program>(i);
+    if (!Has(program)) status["not_installed"].append(kova::content::ProgramName(program));
+  }
   status["files"] = Json::UInt64(files_);
   status["blamed"] = Json::UInt64(blamed_);
   return status;

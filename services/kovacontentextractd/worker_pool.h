@@ -26,7 +26,7 @@ namespace ferrox::extract {
 class WorkerPool {
  public:
   struct Options {
-    /// The path of each program; "" where it is not installed.
+    /// The path of each program, of those too that are not installed.
     std::array<std::string, kova::content::kPrograms> programs;
     std::string empty_folder;  ///< what workers see of the file system, where that can be arranged
     unsigned workers_max = std::max(std::thread::hardware_concurrency(), 1U);
@@ -42,14 +42,16 @@ class WorkerPool {
 
   /// Starts a worker, which tells what of the sandbox this kernel lacks. @throws Error kInternal when that fails.
   void Probe(kova::content::Program program);
-  bool Has(kova::content::Program program) const { return !options_.programs[static_cast<size_t>(program)].empty(); }
+  /// Whether it is installed now.
+  bool Has(kova::content::Program program) const;
 
   /// Has a file read; waits for a free worker, then at most for the longest read. From any thread. A file that kills
   /// its worker, keeps it too long or makes it lie has only "_KOVAExtractError", whatever `text` was handed before.
   /// @throws Error kInternal when no worker can be started.
   Answer Read(kova::content::Program program, const Task& task, const TextSink& text);
 
-  /// "workers" and "workers_max", "missing" (what the sandbox lacks), "files" and "blamed" since the daemon's start.
+  /// "workers" and "workers_max", "missing" (what the sandbox lacks), "not_installed" (names of programs), "files" and
+  /// "blamed" since the daemon's start.
   Json::Value Status() const;
 
  private:

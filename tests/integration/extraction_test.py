@@ -5,7 +5,7 @@ import re
 import signal
 import unittest
 
-from instance import InstanceTestCase, wait_for, write
+from instance import BIN, InstanceTestCase, wait_for, write
 
 DAEMON = "kovacontentextractd"
 NOBODY = 65534
@@ -83,6 +83,29 @@ class ExtractionTest(InstanceTestCase):
         write(f"{folder}/same.txt", "balloon changed")
         self.ctl("index", "docs", "--wait")
         self.assertIsNone(self.fields(folder, "_KOVAExtractError")["same.txt"]["_KOVAExtractError"])
+
+    def test_reader_that_is_not_installed_costs_nothing_and_is_used_once_it_is(self):
+        pdf = (b"%PDF-1.4\n1 0 obj<</Type/Catalog/Pages 2 0 R>>endobj\n2 0 obj<</Type/Pages/Kids[3 0 R]/Count 1>>endobj\n"
+               b"3 0 obj<</Type/Page/Parent 2 0 R/MediaBox[0 0 99 99]/Contents 4 0 R/Resources<</Font<</F<</Type/Font"
+               b"/Subtype/Type1/BaseFont/Helvetica>>>>>>>>endobj\n4 0 obj<</Length 35>>stream\n"
+               b"BT /F 9 Tf 9 9 Td (zeppelin) Tj ET \nendstream endobj\ntrailer<</Root 1 0 R>>\n")
+        programs = f"{self.instance.root}/readers"
+        os.makedirs(programs)
+        os.symlink(f"{BIN}/kovacontentworker", f"{programs}/kovacontentworker")
+        self.instance.env["FERROX_LIBEXEC"] = programs
+        folder = self.indexed(a="balloon")
+        write(f"{folder}/a.pdf", pdf)
+        self.ctl("index", "docs", "--wait")
+        state = self.commit_and_status()
+        self.assertIn(b"not installed: kovacontentworker-pdf;", state)
+        self.assertRegex(state, b"1 its reader, kovacontentworker-pdf, is not installed")
+        written = self.docs()["written"]
+        self.ctl("index", "docs", "--wait")
+        self.assertEqual(written, self.docs()["written"], "nothing has changed")
+        os.symlink(f"{BIN}/kovacontentworker-pdf", f"{programs}/kovacontentworker-pdf")
+        self.ctl("index", "docs", "--wait")
+        self.assertEqual(written + 1, self.docs()["written"])
+        self.assertEqual([os.fsencode(f"{folder}/a.pdf")], self.instance.search("zeppelin"))
 
     def commit_and_status(self):
         self.instance.ask("kovaelasticd", {"command": "commit", "data": {"id": "fileindex_docs"}})

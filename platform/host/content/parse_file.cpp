@@ -10,6 +10,7 @@
 
 #include "platform/host/content/extract_client.h"
 #include "platform/host/content/facts.h"
+#include "platform/host/content/programs.h"
 
 namespace kova::content {
 
@@ -58,6 +59,12 @@ void ParseFile(const std::string& path, const Json::Value& config, Json::Value& 
   } else if (facts.info.stx_size > 0 && (type == nullptr || FormatOf(type) != nullptr)) {
     AddContent(path, facts, document);
   }
+}
+
+int ExtractVersion(const std::string& content_type) {
+  using namespace kova::content;
+  const Format* format = FormatOf(content_type);
+  return format != nullptr && IsInstalled(format->program) ? format->version : 0;
 }
 
 }  // namespace KOVA::CONTENT_EXTRACT

@@ -30,8 +30,8 @@ void ParseFile(const std::string& path, const Json::Value& config, Json::Value& 
 /// "" when that was not so.
 std::string ExtractionProblem();
 
-/// The version of what reads files of a content type now; 0 when nothing does. A document that has an error, or was
-/// made when there was no reader, and an older version than this is worth another try.
+/// The version of what reads files of a content type now; 0 when nothing does, or it is not installed. A document that
+/// has an error, or was made when there was no reader, and an older version than this is worth another try.
 int ExtractVersion(const std::string& content_type);
 
 /// The "_KOVAStamp" that ParseFile gives a file whose `lstat` is `status`: a short text without control characters.

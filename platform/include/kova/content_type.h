@@ -1,5 +1,6 @@
 #pragma once
 
+#include <string>
 #include <string_view>
 
 /// What kind of content a file has, by its name and its first bytes, and who reads it.
@@ -11,6 +12,9 @@ enum class Program { kGeneral, kMail, kPdf, kPhoto, kVideo };
 inline constexpr int kPrograms = 5;
 /// The name of a program, as it is installed.
 const char* ProgramName(Program program);
+/// The folder of these programs, or where those that are not installed would be: FERROX_LIBEXEC, that of the program
+/// that asks, or "../libexec" from there, whichever has the general one; "" when none has.
+const std::string& ProgramFolder();
 
 struct Format {
   std::string_view type;
