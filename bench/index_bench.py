@@ -14,15 +14,15 @@ import json
 import os
 import random
 import re
-import resource
 import shutil
 import socket
 import statistics
 import struct
-import subprocess
 import sys
 import tempfile
 import time
+
+import indexers
 
 WORD = re.compile(rb"(?<![\w.-])[a-z]{4,20}(?![\w-]|\.\w)")
 TEXT_MAX_BYTES = 1 << 20
@@ -80,64 +80,23 @@ def choose_queries(words, seed):
     }
 
 
-def folder_bytes(path):
-    return sum(os.lstat(os.path.join(where, name)).st_blocks * 512
-               for where, _, names in os.walk(path) for name in names)
-
-
 def percentile(values, part):
     return sorted(values)[min(len(values) - 1, int(len(values) * part))]
 
 
-class Ours:
-    """A private instance, driven by the tool and asked over the engine's socket."""
+class Ours(indexers.Ours):
+    """Asked over the engine's socket."""
 
-    def __init__(self, build, scratch):
-        self.tool = os.path.join(build, "bin", "fileindexctl")
-        self.root = os.path.join(scratch, "root")
-        os.mkdir(self.root)
-
-    def ctl(self, *arguments):
-        return subprocess.run([self.tool, "--root", self.root, *arguments], check=True, capture_output=True, text=True)
-
-    def pids(self):
-        found = []
-        for daemon in ("kovaelasticd", "fileindexd"):
-            with open(f"{self.root}/var/run/{daemon}.pid", encoding="ascii") as file:
-                found.append(int(file.read()))
-        return found
-
-    def cpu_seconds(self):
-        ticks = 0
-        for pid in self.pids():
-            with open(f"/proc/{pid}/stat", encoding="ascii") as file:
-                fields = file.read().rpartition(")")[2].split()
-            ticks += int(fields[11]) + int(fields[12])
-        return ticks / os.sysconf("SC_CLK_TCK")
-
-    def peak_kib(self):
-        total = 0
-        for pid in self.pids():
-            with open(f"/proc/{pid}/status", encoding="ascii") as file:
-                total += int(re.search(r"VmHWM:\s+(\d+)", file.read()).group(1))
-        return total
-
-    def index(self, corpus):
+    def index(self, folder):
+        figures = super().index(folder)
         self.ctl("up")
-        cpu, start = self.cpu_seconds(), time.monotonic()
-        self.ctl("share", "add", corpus)
-        self.ctl("index", "corpus", "--wait")
-        result = {"wall_s": time.monotonic() - start, "cpu_s": self.cpu_seconds() - cpu, "peak_MiB": self.peak_kib() / 1024}
-        self.ctl("down")  # closing folds the write-ahead log into the index, so that its size is the real one
-        result["index_MB"] = folder_bytes(f"{self.root}/var/lib/kova/fileindex/db") / 1e6
-        self.ctl("up")
-        return result
+        return figures
 
     def ask(self, query):
         request = json.dumps({"command": "search", "data": {"id": "fileindex_corpus", "query": query, "limit": 10,
                                                             "sort": "relevance", "snippet": True}}).encode()
         with socket.socket(socket.AF_UNIX) as connection:
-            connection.connect(f"{self.root}/var/run/kovaelasticd.sock")
+            connection.connect(self.socket("kovaelasticd"))
             connection.sendall(struct.pack("=I", len(request)) + request)
             stream = connection.makefile("rb")
             reply = json.loads(stream.read(struct.unpack("=I", stream.read(4))[0]))
@@ -145,26 +104,11 @@ class Ours:
             raise RuntimeError(f"{query}: {reply['error']}")
         return reply["data"]["total"]
 
-    def close(self):
-        subprocess.run([self.tool, "--root", self.root, "down"], check=False, capture_output=True)
 
+class Recoll(indexers.Recoll):
+    """Asked through its Python module."""
 
-class Recoll:
-    """recollindex with its own defaults, asked through its Python module."""
-
-    def __init__(self, scratch):
-        self.config = os.path.join(scratch, "recoll")
-        os.mkdir(self.config)
-        self.db = None
-
-    def index(self, corpus):
-        with open(f"{self.config}/recoll.conf", "w", encoding="utf-8") as file:
-            file.write(f"topdirs = {corpus}\nloglevel = 2\n")
-        before, start = resource.getrusage(resource.RUSAGE_CHILDREN), time.monotonic()
-        subprocess.run(["recollindex", "-c", self.config], check=True, capture_output=True)
-        wall, after = time.monotonic() - start, resource.getrusage(resource.RUSAGE_CHILDREN)
-        return {"wall_s": wall, "cpu_s": after.ru_utime + after.ru_stime - before.ru_utime - before.ru_stime,
-                "peak_MiB": after.ru_maxrss / 1024, "index_MB": folder_bytes(f"{self.config}/xapiandb") / 1e6}
+    db = None
 
     def ask(self, query):
         from recoll import recoll  # pylint: disable=import-outside-toplevel
