@@ -19,6 +19,8 @@ import subprocess
 import sys
 import tempfile
 
+import source_packages
+
 HERE = os.path.dirname(os.path.abspath(__file__))
 
 
@@ -48,6 +50,14 @@ class Donors:
             raise MissingDonor(f"these packages cannot be fetched: {' '.join(missing)}\n{reasons}"
                                "remedy: 'apt-get update' as root when the lists are old or missing, or a network; "
                                f"or unpack each by hand: dpkg-deb -x FILE.deb {self.folder}/PACKAGE")
+
+    def fetch_sources(self):
+        folder = os.path.join(self.folder, "sources")
+        with locked(os.path.join(self.folder, ".lock")):
+            problem = source_packages.fetch(folder)
+        if problem:
+            raise MissingDonor(problem)
+        return folder
 
     @staticmethod
     def download(packages, folder):
@@ -109,6 +119,13 @@ class Corpus:
         if not os.path.isfile(found):
             raise MissingDonor(f"package {package} has no file {path}: another version of it is here; "
                                "take another file, or another package")
+        return found
+
+    def source_donor(self, package, path):
+        """The path of a file out of one of source_packages.PACKAGES, as named below its topmost folder."""
+        found = os.path.join(self.donors.fetch_sources(), package, path)
+        if not os.path.exists(found):
+            raise MissingDonor(f"source package {package} has no file {path}: another version of it is here")
         return found
 
     def donor_bytes(self, package, path):

@@ -26,6 +26,8 @@ struct Format {
 
 /// By an extension in lower case, without its dot; null for one that is not known.
 const char* TypeByExtension(std::string_view extension);
+/// The type that some extension has and whose name `text` begins with; null when there is none.
+const char* TypeAtBeginning(std::string_view text);
 /// How many of a file's first bytes tell its type.
 inline constexpr size_t kHeadBytes = 4096;
 /// By name and first bytes: what the name says, unless the bytes are those of something else. Null when neither tells.

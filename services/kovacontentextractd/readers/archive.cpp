@@ -10,6 +10,7 @@
 
 #include "services/kovacontentextractd/readers/byte_source.h"
 #include "services/kovacontentextractd/readers/encoding.h"
+#include "services/kovacontentextractd/readers/member_names.h"
 #include "services/kovacontentextractd/readers/zip_container.h"
 
 namespace ferrox::extract {
@@ -63,10 +64,13 @@ std::unique_ptr<archive, Free> Open(Input& input) {
   archive* const raw = reader.get();
   // One by one: the library's "all" has packings that it starts programs for.
   for (const auto support :
-       {&archive_read_support_filter_gzip, &archive_read_support_filter_bzip2, &archive_read_support_filter_xz,
-        &archive_read_support_filter_lzma, &archive_read_support_filter_zstd, &archive_read_support_filter_compress,
-        &archive_read_support_format_tar, &archive_read_support_format_7zip, &archive_read_support_format_rar,
-        &archive_read_support_format_rar5, &archive_read_support_format_cpio, &archive_read_support_format_raw}) {
+       {&archive_read_support_filter_gzip,    &archive_read_support_filter_bzip2,    &archive_read_support_filter_xz,
+        &archive_read_support_filter_lzma,    &archive_read_support_filter_lzip,     &archive_read_support_filter_zstd,
+        &archive_read_support_filter_lz4,     &archive_read_support_filter_compress, &archive_read_support_filter_rpm,
+        &archive_read_support_format_tar,     &archive_read_support_format_zip,      &archive_read_support_format_7zip,
+        &archive_read_support_format_rar,     &archive_read_support_format_rar5,     &archive_read_support_format_cpio,
+        &archive_read_support_format_ar,      &archive_read_support_format_cab,      &archive_read_support_format_lha,
+        &archive_read_support_format_iso9660, &archive_read_support_format_raw}) {
     (void)support(raw);
   }
   (void)archive_read_set_callback_data(raw, &input);
@@ -110,12 +114,6 @@ bool SkipMember(archive* reader, Findings& findings) {
   return Unpack(reader, findings, [](std::string_view) { return true; });
 }
 
-bool AddName(std::string_view name, Findings& findings) {
-  const bool more = findings.AddText(name);
-  findings.Break();
-  return more;
-}
-
 /// The library turns names into the encoding of the locale, and drops those that it does not have.
 locale_t Utf8Locale() {
   static const locale_t locale = newlocale(LC_CTYPE_MASK, "C.UTF-8", nullptr);
@@ -152,17 +150,30 @@ void AddPackedFile(archive* reader, Findings& findings) {
   if (Decode(bytes, bytes.size() == limit, {}, decoded)) (void)findings.AddText(decoded.text);
 }
 
-void AddNames(archive* reader, Findings& findings) {
+const char* ProblemOf(archive* reader) {
+  return archive_read_has_encrypted_entries(reader) > 0 ? "encrypted" : "damaged";
+}
+
+void AddNames(archive* reader, MemberNames& names, Findings& findings) {
   for (int count = 0; count < kNamesMax; ++count) {
     archive_entry* entry = nullptr;
     const int result = archive_read_next_header(reader, &entry);
     if (result == ARCHIVE_EOF) return;
-    if (result < ARCHIVE_WARN) return findings.Fail("damaged");
+    if (result < ARCHIVE_WARN) return findings.Fail(ProblemOf(reader));
     if (archive_format(reader) == ARCHIVE_FORMAT_RAW) return AddPackedFile(reader, findings);
     const char* name = NameOf(entry);
-    if (name != nullptr && !AddName(name, findings)) return;
-    if (!SkipMember(reader, findings)) return findings.Fail("damaged");
+    if (name != nullptr && !names.Add(name)) return;
+    if (!SkipMember(reader, findings)) return findings.Fail(ProblemOf(reader));
   }
+}
+
+/// The names of a ZIP file, out of the list at its end. False when it has none that makes sense.
+bool AddZipNames(const Source& source, MemberNames& names) {
+  Findings unused;
+  const ZipContainer zip(source, unused);
+  int count = 0;
+  zip.EachName([&](const char* bytes, const char* utf8) { return names.Add(bytes, utf8) && ++count < kNamesMax; });
+  return zip.IsOpen();
 }
 
 }  // namespace
@@ -170,18 +181,14 @@ void AddNames(archive* reader, Findings& findings) {
 void PrepareArchive() { (void)Utf8Locale(); }
 
 void ReadArchive(const Source& source, Findings& findings) {
-  if (FileBytes(source).ReadAt(0, 2) == "PK") {
-    const ZipContainer zip(source, findings);
-    for (const std::string& name : zip.Names("", "", kNamesMax)) {
-      if (!AddName(name, findings)) return;
-    }
-    return;
-  }
+  MemberNames names(findings);
+  if (FileBytes(source).ReadAt(0, 2) == "PK" && AddZipNames(source, names)) return names.Finish();
   const Utf8Names scope;
   Input input(source);
   const std::unique_ptr<archive, Free> reader = Open(input);
   if (reader == nullptr) return findings.Fail("damaged");
-  AddNames(reader.get(), findings);
+  AddNames(reader.get(), names, findings);
+  names.Finish();
 }
 
 }  // namespace ferrox::extract

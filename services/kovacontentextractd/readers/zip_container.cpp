@@ -125,4 +125,13 @@ std::vector<std::string> ZipContainer::Names(std::string_view begin, std::string
   return names;
 }
 
+void ZipContainer::EachName(const std::function<bool(const char* bytes, const char* utf8)>& add) const {
+  const zip_int64_t count = archive_ != nullptr ? zip_get_num_entries(archive_, 0) : 0;
+  for (zip_int64_t i = 0; i < count; ++i) {
+    const char* bytes = zip_get_name(archive_, static_cast<zip_uint64_t>(i), ZIP_FL_ENC_RAW);
+    const char* utf8 = zip_get_name(archive_, static_cast<zip_uint64_t>(i), 0);
+    if (bytes != nullptr && utf8 != nullptr && !add(bytes, utf8)) return;
+  }
+}
+
 }  // namespace ferrox::extract

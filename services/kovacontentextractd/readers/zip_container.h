@@ -1,5 +1,6 @@
 #pragma once
 
+#include <functional>
 #include <memory>
 #include <string>
 #include <string_view>
@@ -30,6 +31,9 @@ class ZipContainer {
   std::string ReadMember(std::string_view name, size_t limit_bytes);
   /// The names that begin and end so, those with numbers in them in the order of their numbers; at most `limit`.
   std::vector<std::string> Names(std::string_view begin, std::string_view end, size_t limit = 10000) const;
+  /// Gives all names in the file's order to `add`, until it returns false: the bytes that the file has, and the same in
+  /// UTF-8, taken from the code page of DOS where it is not that.
+  void EachName(const std::function<bool(const char* bytes, const char* utf8)>& add) const;
 
  private:
   friend class ZipMember;
