@@ -31,7 +31,6 @@ void RequireTextWhole(const std::string& text) {
   const bool whole = CopyText(region.Get(), text.size(), [&copied](size_t offset, std::string_view piece) {
     Require(offset == copied.size());
     copied += piece;
-    return true;
   });
   Require(text.compare(0, copied.size(), copied) == 0 && ValidUtf8Prefix(copied) == copied.size());
   Require(whole == (text.size() <= Limits().text_bytes && ValidUtf8Prefix(text) == text.size()));

@@ -28,12 +28,41 @@ bool WaitFor(int fd, short events, int timeout_ms) {
   return ready > 0;
 }
 
-bool SendAll(int fd, const char* data, size_t size, int idle_timeout_ms) {
-  while (size > 0) {
-    const ssize_t sent = send(fd, data, size, MSG_NOSIGNAL | MSG_DONTWAIT);
+/// What of a frame has been sent, and the descriptor that goes with its first byte.
+struct Outgoing {
+  char header[sizeof(uint32_t)];
+  const std::string& body;
+  int descriptor;
+  size_t sent = 0;
+
+  size_t Left() const { return sizeof(header) + body.size() - sent; }
+
+  ssize_t Send(int fd) {
+    const size_t of_header = std::min(sent, sizeof(header)), of_body = sent - of_header;
+    iovec parts[] = {{header + of_header, sizeof(header) - of_header},
+                     {const_cast<char*>(body.data()) + of_body, body.size() - of_body}};
+    alignas(cmsghdr) char control[CMSG_SPACE(sizeof(int))] = {};
+    msghdr message = {};
+    message.msg_iov = parts;
+    message.msg_iovlen = 2;
+    if (descriptor >= 0 && sent == 0) {
+      message.msg_control = control;
+      message.msg_controllen = sizeof(control);
+      cmsghdr* ancillary = CMSG_FIRSTHDR(&message);
+      ancillary->cmsg_level = SOL_SOCKET;
+      ancillary->cmsg_type = SCM_RIGHTS;
+      ancillary->cmsg_len = CMSG_LEN(sizeof(int));
+      memcpy(CMSG_DATA(ancillary), &descriptor, sizeof(int));
+    }
+    return sendmsg(fd, &message, MSG_NOSIGNAL | MSG_DONTWAIT);
+  }
+};
+
+bool SendAll(int fd, Outgoing& frame, int idle_timeout_ms) {
+  while (frame.Left() > 0) {
+    const ssize_t sent = frame.Send(fd);
     if (sent > 0) {
-      data += sent;
-      size -= static_cast<size_t>(sent);
+      frame.sent += static_cast<size_t>(sent);
     } else if (sent < 0 && errno == EAGAIN) {
       if (!WaitFor(fd, POLLOUT, idle_timeout_ms)) return false;
     } else if (sent == 0 || errno != EINTR) {
@@ -95,17 +124,15 @@ int ConnectUnixSocket(const std::string& path) {
   return -1;
 }
 
-bool SendFrame(int fd, const std::string& message, uint32_t limit_bytes, int idle_timeout_ms) {
+bool SendFrame(int fd, const std::string& message, uint32_t limit_bytes, int idle_timeout_ms, int descriptor) {
   if (message.size() > limit_bytes) {
     errno = EMSGSIZE;
     return Fail();
   }
   const auto length = static_cast<uint32_t>(message.size());
-  char header[sizeof(length)];
-  memcpy(header, &length, sizeof(length));
-  const bool sent = SendAll(fd, header, sizeof(header), idle_timeout_ms) &&
-                    SendAll(fd, message.data(), message.size(), idle_timeout_ms);
-  return sent || Fail();
+  Outgoing frame = {{}, message, descriptor};
+  memcpy(frame.header, &length, sizeof(length));
+  return SendAll(fd, frame, idle_timeout_ms) || Fail();
 }
 
 bool RecvFrame(int fd, std::string& message, uint32_t limit_bytes) {

@@ -9,8 +9,9 @@ namespace kova {
 /// A stream socket connected to the Unix-domain socket at `path`, or -1 with the failure recorded.
 int ConnectUnixSocket(const std::string& path);
 
-/// Sends one message; false when it is over the limit, the peer is gone, or it takes nothing for `idle_timeout_ms`.
-bool SendFrame(int fd, const std::string& message, uint32_t limit_bytes, int idle_timeout_ms);
+/// Sends one message, and a descriptor with it unless that is -1; false when the message is over the limit, the peer is
+/// gone, or it takes nothing for `idle_timeout_ms`.
+bool SendFrame(int fd, const std::string& message, uint32_t limit_bytes, int idle_timeout_ms, int descriptor = -1);
 
 /// Receives one message; waits for as long as the peer does. False when the peer closes early, or announces more than
 /// the limit. Memory grows with the bytes that have come, not with the length that was announced.

@@ -1,5 +1,6 @@
 #include "services/kovacontentextractd/extractor.h"
 
+#include <fcntl.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -38,10 +39,40 @@ Json::Value ErrorDocument(const std::string& reason) {
 
 }  // namespace
 
+void TextTarget::Take(size_t offset, std::string_view piece) {
+  if (memory_ < 0) {
+    text_.resize(offset);
+    text_.append(piece);
+    return;
+  }
+  const ssize_t put = pwrite(memory_, piece.data(), piece.size(), static_cast<off_t>(offset));
+  FERROX_FAIL_IF(put != static_cast<ssize_t>(piece.size()), Error::kInternal,
+                 "the memory for the text cannot be written: " + ErrnoText());
+}
+
+void TextTarget::End(size_t bytes) {
+  bytes_ = bytes;
+  if (memory_ < 0) text_.resize(bytes);
+}
+
+void TextTarget::AddTo(Json::Value& data) const {
+  if (memory_ >= 0 && bytes_ > 0) data["text_bytes"] = Json::UInt64(bytes_);
+}
+
+void TextTarget::AddTo(std::string& reply) const {
+  if (!text_.empty()) reply.append(1, '\0').append(text_);
+}
+
+void FreeTextMemory(int memory) {
+  struct stat info = {};
+  if (fcntl(memory, F_GET_SEALS) < 0 || fstat(memory, &info) != 0) return;  // it is no memory
+  (void)fallocate(memory, FALLOC_FL_PUNCH_HOLE | FALLOC_FL_KEEP_SIZE, 0, info.st_size);
+}
+
 Extractor::Extractor(const WorkerPool::Options& options) : pool_(options) { pool_.Probe(Program::kGeneral); }
 
 std::string Extractor::Handle(const std::string& request, const services::Peer& peer) {
-  std::string text;
+  TextTarget text(peer.descriptor);
   std::string reply =
       services::AnswerJsonCommand(request, peer, [&](const std::string& type, const Json::Value& data) -> Json::Value {
         if (type == "status") {
@@ -53,13 +84,15 @@ std::string Extractor::Handle(const std::string& request, const services::Peer& 
         std::string root, path;
         GetJsonValue(root, data, "root", true);
         GetJsonValue(path, data, "path", true);
-        return Extract(root, path, text);
+        Json::Value found = Extract(root, path, text);
+        text.AddTo(found);
+        return found;
       });
-  if (!text.empty()) reply.append(1, '\0').append(text);
+  text.AddTo(reply);
   return reply;
 }
 
-Json::Value Extractor::Extract(const std::string& root, const std::string& path, std::string& text) {
+Json::Value Extractor::Extract(const std::string& root, const std::string& path, TextTarget& text) {
   Json::Value found;
   const UniqueFd file = OpenBeneath(root, path);
   struct stat info = {};
@@ -74,7 +107,7 @@ Json::Value Extractor::Extract(const std::string& root, const std::string& path,
   return found;
 }
 
-Json::Value Extractor::Read(int fd, const std::string& path, std::string& text) {
+Json::Value Extractor::Read(int fd, const std::string& path, TextTarget& text) {
   std::array<char, kHeadBytes> head;
   const ssize_t got = pread(fd, head.data(), head.size(), 0);
   if (got < 0) return ErrorDocument(ErrnoText());
@@ -85,11 +118,7 @@ Json::Value Extractor::Read(int fd, const std::string& path, std::string& text) 
   if (type != nullptr) document[kTypeField] = type;
   const Format* format = type != nullptr ? FormatOf(type) : &kUnknown;
   if (got == 0 || format == nullptr) return document;
-  const TextSink sink = [&text](size_t offset, std::string_view piece) {
-    text.resize(offset);
-    text.append(piece);
-    return true;
-  };
+  const TextSink sink = [&text](size_t offset, std::string_view piece) { text.Take(offset, piece); };
   Answer answer = ReadAs(*format, task, document, sink);
   // What only a look at the bytes of an unknown file tells.
   const Format* second = format == &kUnknown ? FormatOf(answer.fields[kTypeField].asString()) : nullptr;
@@ -100,7 +129,7 @@ Json::Value Extractor::Read(int fd, const std::string& path, std::string& text) 
   for (const auto& name : answer.fields.getMemberNames()) {
     if (!document.isMember(name)) document[name] = answer.fields[name];
   }
-  text.resize(answer.text_bytes);
+  text.End(answer.text_bytes);
   return document;
 }
 

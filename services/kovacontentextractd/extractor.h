@@ -1,6 +1,8 @@
 #pragma once
 
+#include <cstddef>
 #include <string>
+#include <string_view>
 
 #include <json/value.h>
 
@@ -8,6 +10,27 @@
 #include "services/support/frame_server.h"
 
 namespace ferrox::extract {
+
+/// Where a file's text goes: into the memory of who asks, or else into a string.
+class TextTarget {
+ public:
+  explicit TextTarget(int memory) : memory_(memory) {}
+  /// @throws Error kInternal when the memory is too small.
+  void Take(size_t offset, std::string_view piece);
+  /// The text has so many bytes; what was taken beyond does not count.
+  void End(size_t bytes);
+  /// Adds the text to a reply with this "data": its bytes behind the reply's text, or in "data" how many there are.
+  void AddTo(Json::Value& data) const;
+  void AddTo(std::string& reply) const;
+
+ private:
+  int memory_;
+  size_t bytes_ = 0;
+  std::string text_;
+};
+
+/// Gives back what a client's memory took of the system's; the client finds zeros there afterwards.
+void FreeTextMemory(int memory);
 
 /// Answers what the daemon is asked (docs/formats/extract.md). From any thread.
 class Extractor {
@@ -19,10 +42,10 @@ class Extractor {
 
   /// What the file at `path` below the folder `root` holds: "gone" true, or "inode" and "document". The text is put
   /// into `text`. @throws Error kInternal when nobody can read it now.
-  Json::Value Extract(const std::string& root, const std::string& path, std::string& text);
+  Json::Value Extract(const std::string& root, const std::string& path, TextTarget& text);
 
  private:
-  Json::Value Read(int fd, const std::string& path, std::string& text);
+  Json::Value Read(int fd, const std::string& path, TextTarget& text);
   Answer ReadAs(const kova::content::Format& format, const Task& task, Json::Value& document, const TextSink& sink);
 
   WorkerPool pool_;

@@ -21,6 +21,9 @@ constexpr char kHelp[] =
 /// For the questions about the daemon's state, which come while all workers are busy.
 constexpr unsigned kSpareThreads = 2;
 
+/// A client keeps its connection for the next file, and with it the memory for texts.
+constexpr std::chrono::seconds kIdleConnection(10);
+
 /// What a large text took is kept for the next one while there is work; the pool gives it back at its end.
 void KeepMemoryForTexts() {
   (void)mallopt(M_ARENA_MAX, 2);
@@ -50,6 +53,9 @@ void Serve() {
   services::FrameServerOptions options;
   options.socket_path = InstancePath(kContentExtractdSocket);
   options.workers = pool_options.workers_max + kSpareThreads;
+  options.idle_timeout = kIdleConnection;
+  options.takes_descriptors = true;
+  options.on_end = &extract::FreeTextMemory;
   services::FrameServer server(options, [&extractor](const std::string& request, const services::Peer& peer) {
     return extractor.Handle(request, peer);
   });

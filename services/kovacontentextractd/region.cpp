@@ -41,7 +41,7 @@ bool CopyText(int region, size_t bytes, const TextSink& sink) {
     if (got <= 0) return false;
     const std::string_view copied(buffer.data(), kept + static_cast<size_t>(got));
     const size_t valid = ValidUtf8Prefix(copied);
-    if (valid > 0 && !sink(read - kept, copied.substr(0, valid))) return false;
+    if (valid > 0) sink(read - kept, copied.substr(0, valid));
     read += static_cast<size_t>(got);
     kept = copied.size() - valid;
     if (kept >= kCharacterMaxBytes) return false;

@@ -8,8 +8,8 @@
 
 namespace ferrox::extract {
 
-/// Takes a piece of a text that begins at byte `offset` of it. @return false when it can take no more
-using TextSink = std::function<bool(size_t offset, std::string_view piece)>;
+/// Takes a piece of a text, which begins at byte `offset` of it. May throw.
+using TextSink = std::function<void(size_t offset, std::string_view piece)>;
 
 /// Makes the memory that a worker shares with the daemon: kRegionBytes, whose size nobody can change. Not valid, with
 /// errno, when there is none.

@@ -16,9 +16,9 @@
 
 #include <json/writer.h>
 
-#include "services/kovacontentextractd/descriptor_passing.h"
 #include "services/kovacontentextractd/sandbox.h"
 #include "services/kovacontentextractd/worker_protocol.h"
+#include "services/support/descriptor_passing.h"
 
 namespace ferrox::extract {
 
@@ -72,7 +72,7 @@ struct Request {
 
 /// The header and the descriptor that comes with it. False when the daemon has hung up, or makes no sense.
 bool ReceiveHeader(RequestHeader& header, int& fd) {
-  const ssize_t got = ReceiveWithDescriptors(kWorkerSocket, &header, sizeof(header), &fd, 1);
+  const ssize_t got = services::ReceiveWithDescriptors(kWorkerSocket, &header, sizeof(header), &fd, 1);
   if (got <= 0 || fd < 0) return false;
   return ReadAll(reinterpret_cast<char*>(&header) + got, sizeof(header) - static_cast<size_t>(got));
 }
@@ -137,7 +137,7 @@ pid_t Fork() { return static_cast<pid_t>(syscall(SYS_clone, CLONE_PARENT | SIGCH
 bool ReceiveFork(int& socket, int& region) {
   char request = 0;
   int descriptors[2];
-  const ssize_t got = ReceiveWithDescriptors(kWorkerSocket, &request, sizeof(request), descriptors, 2);
+  const ssize_t got = services::ReceiveWithDescriptors(kWorkerSocket, &request, sizeof(request), descriptors, 2);
   socket = descriptors[0];
   region = descriptors[1];
   return got == 1 && request == kForkRequest && socket >= 0;

@@ -13,10 +13,10 @@
 #include "common/error.h"
 #include "common/json_util.h"
 #include "common/log.h"
-#include "services/kovacontentextractd/descriptor_passing.h"
 #include "services/kovacontentextractd/region.h"
 #include "services/kovacontentextractd/worker_protocol.h"
 #include "services/kovacontentextractd/worker_template.h"
+#include "services/support/descriptor_passing.h"
 
 namespace ferrox::extract {
 
@@ -73,7 +73,7 @@ bool WorkerProcess::Send(const Task& task) {
                                 static_cast<uint16_t>(task.name.size()), 0, ++requests_};
   std::string bytes(reinterpret_cast<const char*>(&header), sizeof(header));
   bytes += task.reader + task.extension + task.name;
-  return SendWithDescriptors(socket_.Get(), bytes, {task.fd});
+  return services::SendWithDescriptors(socket_.Get(), bytes, {task.fd});
 }
 
 WorkerProcess::Outcome WorkerProcess::Receive(TimePoint end, RawAnswer& answer) {

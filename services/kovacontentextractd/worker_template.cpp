@@ -14,8 +14,8 @@
 #include "common/error.h"
 #include "common/log.h"
 #include "common/scope_exit.h"
-#include "services/kovacontentextractd/descriptor_passing.h"
 #include "services/kovacontentextractd/worker_protocol.h"
+#include "services/support/descriptor_passing.h"
 
 namespace ferrox::extract {
 
@@ -72,7 +72,7 @@ bool WorkerTemplate::IsReady() const {
 }
 
 pid_t WorkerTemplate::Fork(int socket, int region) {
-  const bool asked = SendWithDescriptors(socket_.Get(), std::string_view(&kForkRequest, 1), {socket, region});
+  const bool asked = services::SendWithDescriptors(socket_.Get(), std::string_view(&kForkRequest, 1), {socket, region});
   pollfd state = {socket_.Get(), POLLIN, 0};
   int ready;
   do {

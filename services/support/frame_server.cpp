@@ -1,5 +1,6 @@
 #include "services/support/frame_server.h"
 
+#include <poll.h>
 #include <sys/epoll.h>
 #include <sys/eventfd.h>
 #include <sys/socket.h>
@@ -12,9 +13,8 @@
 #include <array>
 #include <atomic>
 #include <cerrno>
-#include <condition_variable>
 #include <cstring>
-#include <deque>
+#include <memory>
 #include <mutex>
 #include <optional>
 #include <thread>
@@ -22,6 +22,7 @@
 #include <vector>
 
 #include "common/log.h"
+#include "services/support/descriptor_passing.h"
 
 namespace ferrox::services {
 
@@ -33,9 +34,9 @@ constexpr size_t kHeaderBytes = 4;
 constexpr size_t kReadChunkBytes = 64 * 1024;
 constexpr uint64_t kListenId = 0;
 constexpr uint64_t kStopId = 1;
-constexpr uint64_t kWakeId = 2;
-constexpr uint64_t kFirstConnectionId = 3;
+constexpr uint64_t kFirstConnectionId = 2;
 constexpr int kTickMs = 1000;
+constexpr int kFullMs = 10;
 
 sockaddr_un AddressOf(const std::string& path) {
   sockaddr_un address = {};
@@ -72,328 +73,280 @@ UniqueFd Listen(const std::string& path, mode_t mode) {
 Peer PeerOf(int fd) {
   ucred credentials = {};
   socklen_t size = sizeof(credentials);
-  if (getsockopt(fd, SOL_SOCKET, SO_PEERCRED, &credentials, &size) != 0) return {static_cast<uid_t>(-1), 0, 0};
+  if (getsockopt(fd, SOL_SOCKET, SO_PEERCRED, &credentials, &size) != 0) return {static_cast<uid_t>(-1)};
   return {credentials.uid, credentials.gid, credentials.pid};
 }
 
-std::string Framed(const std::string& body) {
-  const auto length = static_cast<uint32_t>(body.size());
-  std::string frame;
-  frame.reserve(kHeaderBytes + body.size());
-  frame.append(reinterpret_cast<const char*>(&length), kHeaderBytes);
-  frame += body;
-  return frame;
-}
-
 enum class Progress { kMore, kComplete, kBroken };
+using Chunk = std::array<char, kReadChunkBytes>;
 
-/// One client: receives a request, waits for its reply, sends it, and so on.
+/// One client: receives a request, has it answered, sends the reply, and so on.
 struct Connection {
-  enum class State { kReceiving, kAnswering, kSending };
+  enum class State { kReceiving, kSending };
 
+  uint64_t id = 0;
   UniqueFd fd;
   Peer peer;
+  UniqueFd descriptor;  ///< peer.descriptor
+  bool busy = false;    ///< a thread is at work on it
   State state = State::kReceiving;
-  std::string buffer;  ///< the frame received or sent so far, header included
-  size_t sent = 0;
-  uint64_t request_bytes = 0;  ///< what the request takes from the server's limit until it is answered
+  std::array<char, kHeaderBytes> header = {};
+  std::string body;  ///< of the request as far as it has come, or of the reply
+  size_t done = 0;   ///< of header and body, received or sent
   SteadyClock::time_point last_progress = SteadyClock::now();
 
-  /// The length of the whole frame, once its header is there.
-  std::optional<uint64_t> FrameBytes() const {
-    if (buffer.size() < kHeaderBytes) return std::nullopt;
+  /// The length of the body, once the header is there.
+  std::optional<uint32_t> BodyBytes() const {
     uint32_t length = 0;
-    memcpy(&length, buffer.data(), kHeaderBytes);
-    return kHeaderBytes + static_cast<uint64_t>(length);
+    if (done < kHeaderBytes) return std::nullopt;
+    memcpy(&length, header.data(), kHeaderBytes);
+    return length;
+  }
+
+  ssize_t ReceiveBytes(void* to, size_t size, bool takes_descriptors) {
+    if (!takes_descriptors) return read(fd.Get(), to, size);
+    int received = -1;
+    const ssize_t got = ReceiveWithDescriptors(fd.Get(), to, size, &received, 1);
+    if (received >= 0) {
+      descriptor.Reset(received);
+      peer.descriptor = received;
+    }
+    return got;
   }
 
   /// Reads what is there, up to the end of the frame. Memory grows with what arrives, not with what is announced.
-  Progress Receive(uint32_t limit_bytes, std::array<char, kReadChunkBytes>& chunk) {
+  Progress Receive(const FrameServerOptions& options, Chunk& chunk) {
     for (;;) {
-      const auto frame_bytes = FrameBytes();
-      if (frame_bytes && *frame_bytes > kHeaderBytes + static_cast<uint64_t>(limit_bytes)) return Progress::kBroken;
-      const uint64_t missing = frame_bytes.value_or(kHeaderBytes) - buffer.size();
+      const auto body_bytes = BodyBytes();
+      if (body_bytes && *body_bytes > options.request_limit_bytes) return Progress::kBroken;
+      const size_t missing = body_bytes ? *body_bytes - body.size() : kHeaderBytes - done;
       if (missing == 0) return Progress::kComplete;
-      const ssize_t got = read(fd.Get(), chunk.data(), std::min<uint64_t>(missing, chunk.size()));
+      const ssize_t got = ReceiveBytes(chunk.data(), std::min(missing, chunk.size()), options.takes_descriptors);
       if (got < 0 && errno == EINTR) continue;
       if (got < 0 && errno == EAGAIN) return Progress::kMore;
       if (got <= 0) return Progress::kBroken;
-      buffer.append(chunk.data(), static_cast<size_t>(got));
+      if (body_bytes) {
+        body.append(chunk.data(), static_cast<size_t>(got));
+      } else {
+        memcpy(header.data() + done, chunk.data(), static_cast<size_t>(got));
+      }
+      done += static_cast<size_t>(got);
       last_progress = SteadyClock::now();
     }
   }
 
+  void BeginSending(std::string reply) {
+    const auto length = static_cast<uint32_t>(reply.size());
+    memcpy(header.data(), &length, kHeaderBytes);
+    body = std::move(reply);
+    state = State::kSending;
+    done = 0;
+    last_progress = SteadyClock::now();
+  }
+
+  void BeginReceiving() {
+    std::string().swap(body);
+    state = State::kReceiving;
+    done = 0;
+  }
+
   Progress Send() {
-    while (sent < buffer.size()) {
-      const ssize_t put = send(fd.Get(), buffer.data() + sent, buffer.size() - sent, MSG_NOSIGNAL);
+    while (done < kHeaderBytes + body.size()) {
+      const size_t of_header = std::min(done, kHeaderBytes), of_body = done - of_header;
+      iovec parts[] = {{header.data() + of_header, kHeaderBytes - of_header},
+                       {body.data() + of_body, body.size() - of_body}};
+      msghdr message = {};
+      message.msg_iov = parts;
+      message.msg_iovlen = 2;
+      const ssize_t put = sendmsg(fd.Get(), &message, MSG_NOSIGNAL);
       if (put < 0 && errno == EINTR) continue;
       if (put < 0 && errno == EAGAIN) return Progress::kMore;
       if (put < 0) return Progress::kBroken;
-      sent += static_cast<size_t>(put);
+      done += static_cast<size_t>(put);
       last_progress = SteadyClock::now();
     }
     return Progress::kComplete;
   }
 };
 
-/// A few threads that answer requests, and the replies that they have ready.
-class Workers {
- public:
-  struct Reply {
-    uint64_t id;
-    std::optional<std::string> body;  ///< none: the handler failed
-  };
-
-  Workers(unsigned count, const FrameServer::Handler& handler, int wake_fd) : handler_(handler), wake_fd_(wake_fd) {
-    for (unsigned i = 0; i < std::max(count, 1U); ++i) threads_.emplace_back([this] { Work(); });
-  }
-
-  ~Workers() { Finish(); }
-
-  /// Waits for the requests being answered; those not begun are dropped.
-  void Finish() {
-    {
-      const std::lock_guard guard(mutex_);
-      stopping_ = true;
-    }
-    changed_.notify_all();
-    for (std::thread& thread : threads_) thread.join();
-    threads_.clear();
-  }
-
-  void Ask(uint64_t id, std::string request, const Peer& peer) {
-    {
-      const std::lock_guard guard(mutex_);
-      requests_.push_back({id, std::move(request), peer});
-    }
-    changed_.notify_one();
-  }
-
-  std::vector<Reply> TakeReplies() {
-    const std::lock_guard guard(mutex_);
-    return std::exchange(replies_, {});
-  }
-
- private:
-  struct Request {
-    uint64_t id;
-    std::string body;
-    Peer peer;
-  };
-
-  void Work() {
-    std::unique_lock lock(mutex_);
-    for (;;) {
-      changed_.wait(lock, [this] { return stopping_ || !requests_.empty(); });
-      if (stopping_) return;
-      const Request request = std::move(requests_.front());
-      requests_.pop_front();
-      lock.unlock();
-      Reply reply{request.id, Answer(request)};
-      lock.lock();
-      replies_.push_back(std::move(reply));
-      const uint64_t one = 1;
-      (void)!write(wake_fd_, &one, sizeof(one));
-    }
-  }
-
-  std::optional<std::string> Answer(const Request& request) {
-    try {
-      return handler_(request.body, request.peer);
-    } catch (const std::exception& error) {
-      Log(LOG_ERR, "frame_server: request of uid %u failed: %s", request.peer.uid, error.what());
-      return std::nullopt;
-    }
-  }
-
-  const FrameServer::Handler& handler_;
-  int wake_fd_;
-  std::mutex mutex_;
-  std::condition_variable changed_;
-  bool stopping_ = false;
-  std::deque<Request> requests_;
-  std::vector<Reply> replies_;
-  std::vector<std::thread> threads_;
-};
-
 }  // namespace
 
+/// One thread accepts connections and ends those that keep us waiting; the others each take a connection that has
+/// something for us, do what can be done without waiting for the peer, and give it back. So a request is answered by
+/// the thread that has read it.
 class FrameServer::Impl {
  public:
   Impl(FrameServerOptions options, Handler handler)
       : options_(std::move(options)),
         handler_(std::move(handler)),
         listener_(Listen(options_.socket_path, options_.socket_mode)),
-        epoll_(epoll_create1(EPOLL_CLOEXEC)),
-        wake_(eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK)) {
-    FERROX_FAIL_IF(!epoll_.Valid() || !wake_.Valid(), Error::kInternal, "epoll: " + ErrnoText());
-    Watch(listener_.Get(), kListenId, EPOLLIN);
-    Watch(wake_.Get(), kWakeId, EPOLLIN);
+        control_(epoll_create1(EPOLL_CLOEXEC)),
+        ready_(epoll_create1(EPOLL_CLOEXEC)),
+        stopped_(eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK)) {
+    FERROX_FAIL_IF(!control_.Valid() || !ready_.Valid() || !stopped_.Valid(), Error::kInternal,
+                   "epoll: " + ErrnoText());
+    Watch(control_, EPOLL_CTL_ADD, listener_.Get(), kListenId, EPOLLIN);
+    Watch(control_, EPOLL_CTL_ADD, stopped_.Get(), kStopId, EPOLLIN);
+    Watch(ready_, EPOLL_CTL_ADD, stopped_.Get(), kStopId, EPOLLIN);
   }
   Impl(const Impl&) = delete;
   Impl& operator=(const Impl&) = delete;
   ~Impl() { (void)unlink(options_.socket_path.c_str()); }
 
   void Run(int stop_fd) {
-    Workers workers(options_.workers, handler_, wake_.Get());
-    if (stop_fd >= 0) Watch(stop_fd, kStopId, EPOLLIN);
-    std::array<epoll_event, 64> events;
+    std::vector<std::thread> threads;
+    for (unsigned i = 0; i < std::max(options_.workers, 1U); ++i) threads.emplace_back([this] { Serve(); });
+    if (stop_fd >= 0) Watch(control_, EPOLL_CTL_ADD, stop_fd, kStopId, EPOLLIN);
     while (!stop_) {
-      const int count = epoll_wait(epoll_.Get(), events.data(), static_cast<int>(events.size()), TimeoutMs());
-      for (int i = 0; i < count; ++i) OnEvent(events[static_cast<size_t>(i)].data.u64, workers);
-      SendReplies(workers);
+      epoll_event event = {};
+      const int count = epoll_wait(control_.Get(), &event, 1, TimeoutMs());
+      if (count == 1 && event.data.u64 == kListenId) Accept();
+      if (count == 1 && event.data.u64 == kStopId) break;
       EndIdle();
     }
+    Stop();
     options_.on_stop();
-    workers.Finish();
-    SendReplies(workers);
+    for (std::thread& thread : threads) thread.join();
   }
 
   void Stop() {
     stop_ = true;
     const uint64_t one = 1;
-    (void)!write(wake_.Get(), &one, sizeof(one));
+    (void)!write(stopped_.Get(), &one, sizeof(one));  // nobody reads it, so that all threads hear of it
   }
 
  private:
-  using Connections = std::unordered_map<uint64_t, Connection>;
+  using Connections = std::unordered_map<uint64_t, std::unique_ptr<Connection>>;
+  enum class Next { kReceive, kSend, kEnd };
 
-  void Watch(int fd, uint64_t id, uint32_t events) {
+  static void Watch(const UniqueFd& epoll, int operation, int fd, uint64_t id, uint32_t events) {
     epoll_event event = {};
     event.events = events;
     event.data.u64 = id;
-    (void)epoll_ctl(epoll_.Get(), EPOLL_CTL_ADD, fd, &event);
-  }
-
-  void Rewatch(Connection& connection, uint64_t id, uint32_t events) {
-    epoll_event event = {};
-    event.events = events;
-    event.data.u64 = id;
-    (void)epoll_ctl(epoll_.Get(), EPOLL_CTL_MOD, connection.fd.Get(), &event);
+    (void)epoll_ctl(epoll.Get(), operation, fd, &event);
   }
 
   /// Without connections nothing can time out, and an idle daemon sleeps.
-  int TimeoutMs() const { return connections_.empty() ? -1 : kTickMs; }
-
-  void OnEvent(uint64_t id, Workers& workers) {
-    if (id == kListenId) {
-      Accept();
-    } else if (id == kStopId) {
-      stop_ = true;
-    } else if (id == kWakeId) {
-      uint64_t count = 0;
-      (void)!read(wake_.Get(), &count, sizeof(count));
-    } else if (const auto it = connections_.find(id); it != connections_.end()) {
-      OnConnection(it, workers);
-    }
+  int TimeoutMs() {
+    const std::lock_guard guard(mutex_);
+    return connections_.empty() ? -1 : kTickMs;
   }
 
   void Accept() {
     for (;;) {
       UniqueFd fd(accept4(listener_.Get(), nullptr, nullptr, SOCK_CLOEXEC | SOCK_NONBLOCK));
-      if (!fd.Valid() && (errno == EMFILE || errno == ENFILE) && EndLongestIdle()) continue;
-      if (!fd.Valid()) return;
-      if (connections_.size() >= options_.connections_max && !EndLongestIdle()) continue;
-      const uint64_t id = next_id_++;
-      Connection& connection = connections_[id];
-      connection.peer = PeerOf(fd.Get());
-      connection.fd = std::move(fd);
-      Watch(connection.fd.Get(), id, EPOLLIN);
+      const bool full = !fd.Valid() && (errno == EMFILE || errno == ENFILE);
+      if (!fd.Valid() && !full) return;
+      std::unique_lock lock(mutex_);
+      const bool room = (!full && connections_.size() < options_.connections_max) || EndLongestIdle();
+      if (fd.Valid() && room) Add(std::move(fd));
+      lock.unlock();
+      if (full && !room) return (void)poll(nullptr, 0, kFullMs);  // who waits to be accepted has us called again
     }
   }
 
-  void OnConnection(Connections::iterator it, Workers& workers) {
-    Connection& connection = it->second;
-    if (connection.state == Connection::State::kReceiving) {
-      const size_t before = connection.buffer.size();
-      const Progress progress = connection.Receive(options_.request_limit_bytes, chunk_);
-      connection.request_bytes += connection.buffer.size() - before;
-      request_bytes_ += connection.buffer.size() - before;
-      if (progress == Progress::kBroken || request_bytes_ > options_.requests_limit_bytes) return End(it);
-      if (progress == Progress::kComplete) StartAnswer(it, workers);
-    } else if (connection.state == Connection::State::kSending) {
-      ContinueSending(it);
+  void Add(UniqueFd fd) {
+    auto connection = std::make_unique<Connection>();
+    connection->id = next_id_++;
+    connection->peer = PeerOf(fd.Get());
+    connection->fd = std::move(fd);
+    Watch(ready_, EPOLL_CTL_ADD, connection->fd.Get(), connection->id, EPOLLIN | EPOLLONESHOT);
+    connections_[connection->id] = std::move(connection);
+  }
+
+  /// What each of the answering threads does.
+  void Serve() {
+    Chunk chunk;
+    while (!stop_) {
+      epoll_event event = {};
+      if (epoll_wait(ready_.Get(), &event, 1, -1) != 1 || event.data.u64 == kStopId) continue;
+      if (Connection* connection = Take(event.data.u64)) Give(*connection, Advance(*connection, chunk));
+    }
+  }
+
+  /// A connection for the calling thread alone; null when it has been ended.
+  Connection* Take(uint64_t id) {
+    const std::lock_guard guard(mutex_);
+    const auto it = connections_.find(id);
+    if (it == connections_.end()) return nullptr;
+    it->second->busy = true;
+    return it->second.get();
+  }
+
+  void Give(Connection& connection, Next next) {
+    const std::lock_guard guard(mutex_);
+    connection.busy = false;
+    if (next == Next::kEnd) {
+      End(connection);
     } else {
-      // Being answered and the peer has gone or hung up: nothing to wait for but the handler.
-      Rewatch(connection, it->first, EPOLLET);
+      const uint32_t events = next == Next::kSend ? EPOLLOUT : EPOLLIN;
+      Watch(ready_, EPOLL_CTL_MOD, connection.fd.Get(), connection.id, events | EPOLLONESHOT);
     }
   }
 
-  void StartAnswer(Connections::iterator it, Workers& workers) {
-    Connection& connection = it->second;
-    connection.state = Connection::State::kAnswering;
-    Rewatch(connection, it->first, EPOLLET);
-    connection.buffer.erase(0, kHeaderBytes);
-    workers.Ask(it->first, std::move(connection.buffer), connection.peer);
-  }
-
-  void SendReplies(Workers& workers) {
-    for (Workers::Reply& reply : workers.TakeReplies()) {
-      const auto it = connections_.find(reply.id);
-      if (it == connections_.end()) continue;
-      if (!reply.body) {
-        End(it);
-        continue;
-      }
-      request_bytes_ -= std::exchange(it->second.request_bytes, 0);
-      it->second.state = Connection::State::kSending;
-      it->second.buffer = Framed(*reply.body);
-      it->second.sent = 0;
-      it->second.last_progress = SteadyClock::now();
-      Rewatch(it->second, it->first, EPOLLOUT);
-      ContinueSending(it);
+  /// As far as it goes without waiting for the peer.
+  Next Advance(Connection& connection, Chunk& chunk) try {
+    if (connection.state == Connection::State::kReceiving) {
+      const size_t before = connection.body.size();
+      const Progress progress = connection.Receive(options_, chunk);
+      const uint64_t added = connection.body.size() - before;
+      if ((request_bytes_ += added) > options_.requests_limit_bytes || progress == Progress::kBroken) return Next::kEnd;
+      if (progress == Progress::kMore) return Next::kReceive;
+      std::string reply = handler_(connection.body, connection.peer);
+      request_bytes_ -= connection.body.size();
+      connection.BeginSending(std::move(reply));
     }
-  }
-
-  void ContinueSending(Connections::iterator it) {
-    Connection& connection = it->second;
     const Progress progress = connection.Send();
-    if (progress == Progress::kBroken) return End(it);
-    if (progress == Progress::kMore) return;
-    connection.state = Connection::State::kReceiving;
-    std::string().swap(connection.buffer);
-    Rewatch(connection, it->first, EPOLLIN);
+    if (progress == Progress::kBroken) return Next::kEnd;
+    if (progress == Progress::kMore) return Next::kSend;
+    connection.BeginReceiving();
+    return Next::kReceive;
+  } catch (const std::exception& error) {
+    Log(LOG_ERR, "frame_server: request of uid %u failed: %s", connection.peer.uid, error.what());
+    return Next::kEnd;
   }
 
-  void End(Connections::iterator it) {
-    request_bytes_ -= it->second.request_bytes;
-    connections_.erase(it);
+  void End(Connection& connection) {
+    if (connection.state == Connection::State::kReceiving) request_bytes_ -= connection.body.size();
+    if (connection.descriptor.Valid()) options_.on_end(connection.descriptor.Get());
+    connections_.erase(connection.id);
   }
 
   void EndIdle() {
     const auto now = SteadyClock::now();
     if (now < next_idle_check_) return;
     next_idle_check_ = now + std::chrono::milliseconds(kTickMs);
+    const std::lock_guard guard(mutex_);
     for (auto it = connections_.begin(); it != connections_.end();) {
-      const auto current = it++;
-      const bool waits_for_peer = current->second.state != Connection::State::kAnswering;
-      if (waits_for_peer && now - current->second.last_progress > options_.idle_timeout) End(current);
+      Connection& current = *it++->second;
+      if (!current.busy && now - current.last_progress > options_.idle_timeout) End(current);
     }
   }
 
   /// Makes room for a newcomer: the connection that has kept us waiting longest goes. False when all are at work.
   bool EndLongestIdle() {
-    auto longest = connections_.end();
-    for (auto it = connections_.begin(); it != connections_.end(); ++it) {
-      if (it->second.state == Connection::State::kAnswering) continue;
-      if (longest == connections_.end() || it->second.last_progress < longest->second.last_progress) longest = it;
+    Connection* longest = nullptr;
+    for (const auto& [id, connection] : connections_) {
+      if (connection->busy) continue;
+      if (longest == nullptr || connection->last_progress < longest->last_progress) longest = connection.get();
     }
-    if (longest == connections_.end()) return false;
-    End(longest);
+    if (longest == nullptr) return false;
+    End(*longest);
     return true;
   }
 
   const FrameServerOptions options_;
   const Handler handler_;
   UniqueFd listener_;
-  UniqueFd epoll_;
-  UniqueFd wake_;
+  UniqueFd control_;  ///< what the accepting thread waits for
+  UniqueFd ready_;    ///< connections that nobody is at work on; what the answering threads wait for
+  UniqueFd stopped_;
   std::atomic<bool> stop_{false};
+  std::atomic<uint64_t> request_bytes_{0};  ///< of all requests that are not answered yet
+  std::mutex mutex_;                        ///< of all below; a connection that is busy is its thread's
   Connections connections_;
   uint64_t next_id_ = kFirstConnectionId;
-  uint64_t request_bytes_ = 0;
-  SteadyClock::time_point next_idle_check_;
-  std::array<char, kReadChunkBytes> chunk_;
+  SteadyClock::time_point next_idle_check_;  ///< of the accepting thread alone
 };
 
 FrameServer::FrameServer(FrameServerOptions options, Handler handler)

@@ -17,6 +17,7 @@ struct Peer {
   uid_t uid = 0;
   gid_t gid = 0;
   pid_t pid = 0;
+  int descriptor = -1;  ///< the last that came with its requests, open as long as its connection is; -1: none
 };
 
 struct FrameServerOptions {
@@ -30,6 +31,10 @@ struct FrameServerOptions {
   unsigned workers = 4;
   /// A connection that neither sends nor takes a byte for so long is ended.
   std::chrono::seconds idle_timeout{60};
+  /// Whether a request may bring a descriptor (SCM_RIGHTS) along; else it is closed.
+  bool takes_descriptors = false;
+  /// Called with the descriptor of a connection when that ends.
+  std::function<void(int descriptor)> on_end = [](int) {};
   /// Called when Run begins to end: what is to hurry the requests that it still waits for.
   std::function<void()> on_stop = [] {};
 };
@@ -39,7 +44,8 @@ struct FrameServerOptions {
 /// leaves early costs its own connection and nothing else.
 class FrameServer {
  public:
-  /// Answers one request; called on one of the workers. An exception ends that connection alone.
+  /// Answers one request; called on one of the workers, which has just read it. An exception ends that connection
+  /// alone.
   using Handler = std::function<std::string(const std::string& request, const Peer& peer)>;
 
   /// Binds and listens. A socket file left by a dead process is replaced; one that answers is not.

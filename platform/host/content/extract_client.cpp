@@ -1,10 +1,18 @@
 #include "platform/host/content/extract_client.h"
 
+#include <fcntl.h>
+#include <poll.h>
+#include <sys/mman.h>
+#include <unistd.h>
+
+#include <algorithm>
 #include <chrono>
 #include <memory>
 #include <mutex>
 #include <optional>
 #include <stdexcept>
+#include <string_view>
+#include <utility>
 
 #include <json/reader.h>
 #include <json/writer.h>
@@ -12,8 +20,8 @@
 #include <kova/content_extract.h>
 #include <kova/instance.h>
 #include <kova/service.h>
-#include <kova/sock_connection.h>
 
+#include "platform/base/frames.h"
 #include "platform/host/child_service.h"
 #include "platform/host/files.h"
 #include "platform/host/share_table.h"
@@ -26,8 +34,11 @@ using SteadyClock = std::chrono::steady_clock;
 
 constexpr char kService[] = "kovacontentextractd";
 constexpr char kSocket[] = "/var/run/kovacontentextractd.sock";
-/// An answer holds at most a megabyte of text, and fields.
-constexpr uint32_t kAnswerMaxBytes = 16U << 20;
+/// Of the text of one file.
+constexpr uint32_t kTextMaxBytes = 1U << 20;
+/// An answer holds at most a text, and fields.
+constexpr uint32_t kMessageMaxBytes = 16U << 20;
+constexpr int kSendMaxMs = 60000;
 /// After a start that failed, no other is tried for so long.
 constexpr std::chrono::seconds kStartPause{5};
 
@@ -59,21 +70,80 @@ std::string StartDaemon() {
   return failure = reason.empty() ? "it could not be started" : reason;
 }
 
-/// Nothing when the daemon does not run, or ends meanwhile.
-std::optional<std::string> AskOnce(const std::string& request) {
-  kovadaemon::DomainSockConnection connection(InstanceRoot() + kSocket);
-  connection.SetMessageLimit(kAnswerMaxBytes);
-  std::string reply;
-  if (!connection.Connect() || !connection.Send(request) || !connection.Recv(reply)) return std::nullopt;
-  return reply;
-}
+/// The calling thread's connection to the daemon, which is kept for its next file, and the memory into which the daemon
+/// puts a file's text: through a socket it would be copied twice more.
+class Channel {
+ public:
+  Channel() = default;
+  Channel(const Channel&) = delete;
+  Channel& operator=(const Channel&) = delete;
+  ~Channel() { Close(); }
+
+  /// Nothing when the daemon does not run, or ends meanwhile.
+  std::optional<std::string> Ask(const std::string& request) {
+    if (!IsOpen() && !Open()) return std::nullopt;
+    std::string reply;
+    const int descriptor = std::exchange(told_, true) ? -1 : memory_;
+    if (kova::SendFrame(socket_, request, kMessageMaxBytes, kSendMaxMs, descriptor) &&
+        kova::RecvFrame(socket_, reply, kMessageMaxBytes)) {
+      return reply;
+    }
+    Close();
+    return std::nullopt;
+  }
+
+  /// The first bytes of the memory; nothing when there are not so many.
+  std::optional<std::string_view> Memory(size_t bytes) const {
+    if (memory_ < 0 || bytes > kTextMaxBytes) return std::nullopt;
+    return std::string_view(static_cast<const char*>(mapped_), bytes);
+  }
+
+ private:
+  /// The daemon ends what has been idle for long; that is readable here.
+  bool IsOpen() {
+    pollfd state = {socket_, POLLIN, 0};
+    if (socket_ >= 0 && poll(&state, 1, 0) == 0) return true;
+    Close();
+    return false;
+  }
+
+  bool Open() {
+    socket_ = kova::ConnectUnixSocket(InstanceRoot() + kSocket);
+    if (socket_ < 0) return false;
+    MakeMemory();
+    return true;
+  }
+
+  /// Without it, texts come with the replies.
+  void MakeMemory() {
+    memory_ = memfd_create("kova text", MFD_CLOEXEC | MFD_ALLOW_SEALING);
+    const bool sized = memory_ >= 0 && ftruncate(memory_, kTextMaxBytes) == 0 &&
+                       fcntl(memory_, F_ADD_SEALS, F_SEAL_GROW | F_SEAL_SHRINK | F_SEAL_SEAL) == 0;
+    mapped_ = sized ? mmap(nullptr, kTextMaxBytes, PROT_READ, MAP_SHARED, memory_, 0) : MAP_FAILED;
+    if (mapped_ == MAP_FAILED && memory_ >= 0) (void)close(std::exchange(memory_, -1));
+  }
+
+  void Close() {
+    if (socket_ >= 0) (void)close(std::exchange(socket_, -1));
+    if (mapped_ != MAP_FAILED) (void)munmap(std::exchange(mapped_, MAP_FAILED), kTextMaxBytes);
+    if (memory_ >= 0) (void)close(std::exchange(memory_, -1));
+    told_ = false;
+  }
+
+  int socket_ = -1;
+  int memory_ = -1;
+  void* mapped_ = MAP_FAILED;
+  bool told_ = false;  ///< the daemon has the memory's descriptor
+};
+
+thread_local Channel t_channel;
 
 std::string Ask(const std::string& request) {
-  std::optional<std::string> reply = AskOnce(request);
+  std::optional<std::string> reply = t_channel.Ask(request);
   if (reply) return *std::move(reply);
   const std::string problem = StartDaemon();
   if (!problem.empty()) ThrowProblem("content cannot be read: " + problem);
-  reply = AskOnce(request);
+  reply = t_channel.Ask(request);
   if (!reply) ThrowProblem("content cannot be read: kovacontentextractd ends before it answers; see its log");
   return *std::move(reply);
 }
@@ -89,13 +159,22 @@ std::string RequestText(const std::string& path) {
   return Json::writeString(builder, request);
 }
 
-/// A JSON object and, behind a zero byte, the file's text.
-bool ReadReply(const std::string& reply, Json::Value& json, std::string& text) try {
+/// The text of a file: in the memory, or behind the reply's JSON and a zero byte. False when there is not so much.
+bool FindText(const std::string& reply, size_t json_bytes, const Json::Value& data, std::string_view& text) {
+  if (json_bytes < reply.size()) text = std::string_view(reply).substr(json_bytes + 1);
+  const Json::Value& bytes = data["text_bytes"];
+  if (bytes.isNull()) return true;
+  const auto found = bytes.isUInt() ? t_channel.Memory(bytes.asUInt()) : std::nullopt;
+  if (found) text = *found;
+  return found.has_value();
+}
+
+bool ReadReply(const std::string& reply, Json::Value& json, std::string_view& text) try {
   const size_t json_bytes = std::min(reply.find('\0'), reply.size());
   const std::unique_ptr<Json::CharReader> reader(Json::CharReaderBuilder().newCharReader());
   if (!reader->parse(reply.data(), reply.data() + json_bytes, &json, nullptr) || !json.isObject()) return false;
-  if (json_bytes < reply.size()) text = reply.substr(json_bytes + 1);
-  return json["success"].isBool() && json["data"].isObject() == json["success"].asBool();
+  if (!json["success"].isBool() || json["data"].isObject() != json["success"].asBool()) return false;
+  return FindText(reply, json_bytes, json["data"], text);
 } catch (const std::exception&) {
   return false;
 }
@@ -104,16 +183,16 @@ bool ReadReply(const std::string& reply, Json::Value& json, std::string& text) t
 
 Extraction ExtractContent(const std::string& path) {
   Json::Value json;
-  std::string text;
+  std::string_view text;
   const std::string reply = Ask(RequestText(path));
   if (!ReadReply(reply, json, text)) ThrowProblem("content cannot be read: kovacontentextractd answers nonsense");
   if (!json["success"].asBool()) ThrowProblem("content cannot be read: " + json["error"]["msg"].asString());
   Extraction extraction;
-  const Json::Value& data = json["data"];
+  Json::Value& data = json["data"];
   extraction.gone = data["gone"].isBool() && data["gone"].asBool();
   extraction.inode = data["inode"].isUInt64() ? data["inode"].asUInt64() : 0;
-  extraction.document = data["document"];
-  if (!text.empty()) extraction.document["KOVAMDTextContent"] = std::move(text);
+  extraction.document = std::move(data["document"]);
+  if (!text.empty()) extraction.document["KOVAMDTextContent"] = Json::Value(text.data(), text.data() + text.size());
   return extraction;
 }
 

@@ -2,6 +2,7 @@
 
 #include <stdexcept>
 #include <string>
+#include <utility>
 
 #include <json/value.h>
 
@@ -27,10 +28,10 @@ bool IsReplaced(const std::string& path, const Extraction& extraction, const str
 /// @throws std::runtime_error when the file is no longer at the path: a document that calls it unreadable, or that has
 /// the content of another, would be taken for true where it has gone; and when content cannot be read at present.
 void AddContent(const std::string& path, const Facts& facts, Json::Value& document) {
-  const Extraction extraction = ExtractContent(path);
+  Extraction extraction = ExtractContent(path);
   if (extraction.gone) throw std::runtime_error(path + " is gone");
   if (IsReplaced(path, extraction, facts.info)) throw std::runtime_error(path + " is another file now");
-  for (const auto& name : extraction.document.getMemberNames()) document[name] = extraction.document[name];
+  for (const auto& name : extraction.document.getMemberNames()) document[name] = std::move(extraction.document[name]);
 }
 
 bool WantsContent(const Json::Value& config) {
