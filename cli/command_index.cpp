@@ -4,7 +4,6 @@
 #include <algorithm>
 #include <chrono>
 #include <cstdio>
-#include <set>
 
 #include "cli/ask.h"
 #include "cli/command_table.h"
@@ -126,13 +125,7 @@ int RunIndex(const Arguments& arguments) {
 }
 
 int RunSuggestRefresh(const Arguments& arguments) {
-  const fileindex::FolderMgr configured;
-  std::vector<std::string> shares = arguments.words;
-  for (const std::string& share : shares) RequireIndexed(sdk::SDKShare(share).GetName(), configured);
-  if (shares.empty()) {
-    const std::set<std::string> indexed = configured.GetIndexedShares();
-    shares.assign(indexed.begin(), indexed.end());
-  }
+  const std::vector<std::string> shares = IndexedShares(arguments.words);
   std::vector<std::string> databases;
   databases.reserve(shares.size());
   for (const std::string& share : shares) databases.push_back(sdk::SDKShare(share).GetDBName());

@@ -41,8 +41,8 @@ void PrintWork(const Json::Value& share) {
 }
 
 void PrintShare(const Json::Value& share, const std::string& notification_problem) {
-  (void)printf("share %s: %s\n", EscapeForTerminal(TextOf(share, "share")).c_str(),
-               EscapeForTerminal(TextOf(share, "path")).c_str());
+  const std::string name = EscapeForTerminal(TextOf(share, "share"));
+  (void)printf("share %s: %s\n", name.c_str(), EscapeForTerminal(TextOf(share, "path")).c_str());
   PrintWork(share);
   (void)fputs(WatchLines(share, notification_problem).c_str(), stdout);
   const Json::Value& index = share["index"];
@@ -58,6 +58,7 @@ void PrintShare(const Json::Value& share, const std::string& notification_proble
                oldest == 0 ? "" : (", the oldest for " + Duration(static_cast<double>(age))).c_str());
   if (index.isObject() && index["extract_errors"].isObject()) {
     PrintReasons("indexed by name only", index["extract_errors"], index["extract_error_examples"]);
+    if (!index["extract_errors"].empty()) (void)printf("      all: fileindexctl unread %s\n", name.c_str());
   }
   Json::Value counts(Json::objectValue);
   Json::Value examples(Json::objectValue);

@@ -201,11 +201,24 @@ CommandGroup HostEvents() {
 
 CommandGroup Inspection() {
   return {"Looking inside",
-          {{"queue show",
-            "FILE",
-            {{"--json", nullptr, "one JSON object a line"}},
-            "Prints the operations that a queue file asks for, one a line; changes nothing.",
-            &RunQueueShow}}};
+          {
+              {"show",
+               "FILE...",
+               {{"--text", nullptr, "its text alone, whole"}, {"--json", nullptr, "one JSON object a line"}},
+               "Shows what the index holds of a file: what was read, by which reader, all fields, and the text's "
+               "beginning.",
+               &RunShow},
+              {"unread",
+               "[SHARE...]",
+               {{"--json", nullptr, "one JSON object a line"}},
+               "Lists the files that could not be read, or not all of them, each with the reason.",
+               &RunUnread},
+              {"queue show",
+               "FILE",
+               {{"--json", nullptr, "one JSON object a line"}},
+               "Prints the operations that a queue file asks for, one a line; changes nothing.",
+               &RunQueueShow},
+          }};
 }
 
 }  // namespace

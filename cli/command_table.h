@@ -49,6 +49,8 @@ int RunFolderList(const Arguments& arguments);
 int RunIndex(const Arguments& arguments);
 int RunSuggestRefresh(const Arguments& arguments);
 int RunSearch(const Arguments& arguments);
+int RunShow(const Arguments& arguments);
+int RunUnread(const Arguments& arguments);
 int RunQueueShow(const Arguments& arguments);
 
 }  // namespace ferrox::cli

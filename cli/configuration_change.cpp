@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <cstring>
+#include <set>
 
 #include "cli/command.h"
 #include "cli/explain.h"
@@ -70,6 +71,14 @@ void RequireIndexed(const std::string& share, const fileindex::FolderMgr& config
   if (configured.IsShareIndexed(share)) return;
   throw Failure("no folder of share \"" + share + "\" is indexed; 'fileindexctl folder add /" + share +
                 "' adds all of it");
+}
+
+std::vector<std::string> IndexedShares(const std::vector<std::string>& names) {
+  const fileindex::FolderMgr configured;
+  for (const std::string& name : names) RequireIndexed(sdk::SDKShare(name).GetName(), configured);
+  if (!names.empty()) return names;
+  const std::set<std::string> indexed = configured.GetIndexedShares();
+  return {indexed.begin(), indexed.end()};
 }
 
 }  // namespace ferrox::cli

@@ -2,6 +2,7 @@
 
 #include <functional>
 #include <string>
+#include <vector>
 
 namespace ferrox::fileindex {
 class FolderMgr;
@@ -23,5 +24,9 @@ bool MarkIfBusy(const std::string& share);
 
 /// @throws Failure when no folder of the share is indexed.
 void RequireIndexed(const std::string& share, const fileindex::FolderMgr& configured);
+
+/// The shares of these names; without names, all that have an indexed folder.
+/// @throws Failure when no folder of one is indexed; Error kNoSuchShare.
+std::vector<std::string> IndexedShares(const std::vector<std::string>& names);
 
 }  // namespace ferrox::cli

@@ -52,10 +52,10 @@ std::string OnDisk(const std::string& text) {
   if (!share_path.empty()) return share_path;
   const std::string real = RealPath(path);
   if (!real.empty() && real != path && !SharePathOnDisk(real).empty()) {
-    throw Failure(text + " is, without links, " + real + "; add that folder");
+    throw Failure(text + " is, without links, " + real + "; give that path");
   }
   throw Failure(text +
-                (real.empty() ? " is neither a folder in a share nor one on disk"
+                (real.empty() ? " is neither in a share nor on the disk"
                               : " lies in no share; 'fileindexctl share add' makes it one") +
                 ("; 'fileindexctl share list' shows the shares"));
 }

@@ -125,8 +125,10 @@ Json::Value OnDocumentChange(CommandCall& call) {
 GetRequest ReadQuery(const Json::Value& query) {
   GetRequest request;
   const Json::Value& qsl = RequiredObject(query, "qsl");
-  request.suspects = qsl["suspects"].isBool() && qsl["suspects"].asBool() && qsl.size() == 1;
-  if (request.suspects) return request;
+  const auto is_true = [&qsl](const char* name) { return qsl[name].isBool() && qsl[name].asBool() && qsl.size() == 1; };
+  request.suspects = is_true("suspects");
+  request.unread = is_true("unread");
+  if (request.suspects || request.unread) return request;
   const Json::Value& prefix = qsl["prefix"];
   const Json::Value& term = qsl["term"];
   const bool one = prefix.isNull() != term.isNull() && qsl.size() == 1;

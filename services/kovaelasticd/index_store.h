@@ -13,8 +13,8 @@
 
 namespace ferrox::engine {
 
-/// Which documents Get lists: the one at `term`, or the suspects, or those whose path begins with `prefix`, in the
-/// order of their paths.
+/// Which documents Get lists: the one at `term`, or the suspects, or the unread, or those whose path begins with
+/// `prefix`, in the order of their paths.
 struct GetRequest {
   std::string term;
   std::string prefix;
@@ -23,6 +23,7 @@ struct GetRequest {
   std::vector<std::string> fields;  ///< the fields to load; empty: all
   /// Documents that may not know of a change of their file, which was told of under another of its names.
   bool suspects = false;
+  bool unread = false;  ///< documents with "_KOVAExtractError"
 };
 
 enum class SortKey { kRelevance, kDate, kName, kSize };

@@ -204,9 +204,10 @@ void SqliteStore::Get(const GetRequest& request, const std::function<void(const 
     if (stored.has_value()) take(LoadEntry(*stored, request.fields));
     return;
   }
-  if (request.suspects) {
-    Statement statement = writer_.Prepare(std::string(kSelectRow) +
-                                          "WHERE id IN (SELECT id FROM suspects) AND path > ?1 ORDER BY path LIMIT ?2");
+  if (request.suspects || request.unread) {
+    const char* condition = request.suspects ? "id IN (SELECT id FROM suspects)" : "error IS NOT NULL";
+    Statement statement =
+        writer_.Prepare(std::string(kSelectRow) + "WHERE " + condition + " AND path > ?1 ORDER BY path LIMIT ?2");
     statement.Bind(1, std::string_view(request.after)).Bind(2, request.limit);
     while (statement.Step()) take(LoadEntry(ReadRow(statement), request.fields));
     return;

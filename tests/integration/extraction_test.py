@@ -1,5 +1,6 @@
 """How the index depends on content extraction: it waits for it, uses it again, and does not trust it."""
 
+import json
 import os
 import re
 import signal
@@ -106,6 +107,27 @@ class ExtractionTest(InstanceTestCase):
         self.ctl("index", "docs", "--wait")
         self.assertEqual(written + 1, self.docs()["written"])
         self.assertEqual([os.fsencode(f"{folder}/a.pdf")], self.instance.search("zeppelin"))
+
+    def test_what_was_read_of_a_file_is_told(self):
+        folder = self.indexed(a="zeppelin\nover the sea " * 40)
+        write(f"{folder}/page.html", "<title>Airships</title><p>balloon")
+        for name in ("b\n.pdf", "c.pdf"):
+            write(f"{folder}/{name}", b"%PDF-1.4 damaged")
+        self.ctl("index", "docs", "--wait")
+        shown = self.ctl("show", "/docs/a.txt", f"{folder}/page.html").decode()
+        for expected in (f"{folder}/a.txt\n    content: read (reader version 1)\n    type: text/plain\n",
+                         "    text: 880 B, was UTF-8", "        zeppelin over the sea zeppelin", " ...\n",
+                         "    Title: Airships\n", "        balloon\n"):
+            self.assertIn(expected, shown)
+        self.assertEqual(b"zeppelin\nover the sea " * 40, self.ctl("show", "--text", f"{folder}/a.txt"))
+        self.assertEqual("Airships", json.loads(self.ctl("show", "--json", "/docs/page.html"))["KOVAMDTitle"])
+        self.assertIn(b"content: not read, or not all: damaged", self.ctl("show", "/docs/c.pdf"))
+        self.assertEqual(b"", self.ctl("show", "/docs/none.txt", code=1))
+        lines = [json.loads(line) for line in self.ctl("unread", "--json", "docs").splitlines()]
+        self.assertEqual([(f"{folder}/{name}", "damaged") for name in ("b\n.pdf", "c.pdf")],
+                         [(line["path"], line["reason"]) for line in lines])
+        self.assertEqual(f"{folder}/b\\x0a.pdf\n    damaged\n{folder}/c.pdf\n    damaged\n", self.ctl("unread").decode())
+        self.assertIn(b"all: fileindexctl unread docs", self.commit_and_status())
 
     def commit_and_status(self):
         self.instance.ask("kovaelasticd", {"command": "commit", "data": {"id": "fileindex_docs"}})

@@ -1,0 +1,174 @@
+#include <algorithm>
+#include <cstdio>
+#include <iterator>
+
+#include "cli/ask.h"
+#include "cli/command_table.h"
+#include "cli/configuration_change.h"
+#include "cli/escape.h"
+#include "cli/folder_path.h"
+#include "cli/format.h"
+#include "common/file_util.h"
+#include "fileindex/elastic/elastic_control.h"
+#include "fileindex/folder_mgr.h"
+#include "fileindex/util.h"
+#include "sdk/share.h"
+
+namespace ferrox::cli {
+
+namespace {
+
+constexpr char kTextField[] = "KOVAMDTextContent";
+constexpr char kErrorField[] = "_KOVAExtractError";
+constexpr char kVersionField[] = "_KOVAExtractVersion";
+constexpr char kPathField[] = "KOVAMDPath";
+constexpr size_t kTextShownBytes = 300;
+constexpr int kPageEntries = 10000;
+
+/// What the path says already, or what is told in words of its own.
+constexpr const char* kToldOtherwise[] = {kPathField,     "KOVAMDParent",         "KOVAMDFSName",
+                                          "KOVAMDKind",   "KOVAMDSearchFileName", "KOVAMDDisplayName",
+                                          "KOVAMDIsDir",  "KOVAMDExtension",      "KOVAMDContentType",
+                                          "KOVAMDFSSize", "KOVAMDLogicalSize",    "KOVAMDContentModificationDate",
+                                          kErrorField,    kVersionField,          "_KOVANeedMeta",
+                                          "_KOVAStamp",   "_KOVATextEncoding",    "_KOVATextCut"};
+
+Json::Value Entries(const std::string& share, Json::Value query) {
+  Json::Value data;
+  data["id"] = fileindex::elastic::GetFileIndexID(share);
+  data["query"] = std::move(query);
+  return AskEngine("document_get_by_query", data);
+}
+
+Json::Value QueryOf(const std::string& path, const char* field = nullptr) {
+  Json::Value query;
+  query["qsl"]["term"][kPathField] = path;
+  if (field != nullptr) query["load_field"].append(field);
+  return query;
+}
+
+/// "KOVAMDTitle" is "Title", "KOVAStateOrProvince" "StateOrProvince".
+std::string FriendlyName(const std::string& field) {
+  for (const char* prefix : {"_KOVAMD", "_KOVA", "KOVAMD", "KOVA"}) {
+    if (StringStartWith(field, prefix)) return field.substr(std::string(prefix).size());
+  }
+  return field;
+}
+
+std::string FriendlyValue(const std::string& field, const Json::Value& value) {
+  const bool is_date = field.size() > 4 && field.compare(field.size() - 4, 4, "Date") == 0;
+  if (is_date && value.isInt64()) return Date(value.asInt64());
+  if (value.isString()) return EscapeOneLine(value.asString());
+  if (value.isNumeric() || value.isBool()) return value.asString();
+  std::string joined;
+  for (const Json::Value& element : value) joined += (joined.empty() ? "" : "; ") + FriendlyValue(field, element);
+  return joined;
+}
+
+void PrintLine(const std::string& name, const std::string& value) {
+  (void)printf("    %s: %s\n", EscapeForTerminal(name).c_str(), value.c_str());
+}
+
+/// Whether the content was read, by what, and why not.
+std::string Reading(const Json::Value& document) {
+  if (document["KOVAMDIsDir"].isBool() && document["KOVAMDIsDir"].asBool()) return "a folder";
+  if (!document["_KOVANeedMeta"].isBool()) return "not wanted; 'fileindexctl folder set --kinds' chooses what is read";
+  const std::string error = TextOf(document, kErrorField);
+  const std::string reader = " (reader version " + std::to_string(IntOf(document, kVersionField)) + ")";
+  if (!error.empty()) return "not read, or not all: " + EscapeOneLine(error) + reader;
+  return IntOf(document, kVersionField) == 0 ? "no reader for this type" : "read" + reader;
+}
+
+void PrintText(const Json::Value& document, const std::string& text) {
+  if (text.empty()) return;
+  const std::string encoding = TextOf(document, "_KOVATextEncoding");
+  PrintLine("text", Size(static_cast<int64_t>(text.size())) +
+                        (encoding.empty() ? "" : ", was " + EscapeOneLine(encoding)) +
+                        (document["_KOVATextCut"].isBool() ? ", the beginning of more" : ""));
+  size_t end = std::min(text.size(), kTextShownBytes);
+  while (end < text.size() && (static_cast<unsigned char>(text[end]) & 0xC0) == 0x80) --end;
+  (void)printf("        %s%s\n", EscapeOneLine(text.substr(0, end)).c_str(), end < text.size() ? " ..." : "");
+}
+
+void PrintDocument(const Json::Value& document, const std::string& text) {
+  (void)printf("%s\n", EscapeForTerminal(TextOf(document, kPathField)).c_str());
+  PrintLine("content", Reading(document));
+  if (document.isMember("KOVAMDContentType")) PrintLine("type", EscapeOneLine(TextOf(document, "KOVAMDContentType")));
+  PrintLine("size", Size(IntOf(document, "KOVAMDFSSize")));
+  for (const std::string& field : document.getMemberNames()) {
+    const bool told =
+        std::find(std::begin(kToldOtherwise), std::end(kToldOtherwise), field) != std::end(kToldOtherwise);
+    if (!told) PrintLine(FriendlyName(field), FriendlyValue(field, document[field]));
+  }
+  PrintText(document, text);
+}
+
+/// @return whether the file is in the index.
+bool Show(const std::string& file, const Arguments& arguments) {
+  const std::string share_path = ToSharePath(file, fileindex::FolderMgr());
+  const std::string path = fileindex::GetFullPath(share_path);
+  const std::string share = fileindex::GetShareNameByPath(share_path);
+  Json::Value documents = Entries(share, QueryOf(path));
+  if (documents.empty()) {
+    (void)fprintf(stderr, "%s is not in the index; 'fileindexctl index %s' looks for what is not\n",
+                  EscapeForTerminal(path).c_str(), EscapeForTerminal(share).c_str());
+    return false;
+  }
+  const Json::Value texts = Entries(share, QueryOf(path, kTextField));
+  const std::string text = texts.empty() ? "" : TextOf(texts[0], kTextField);
+  if (arguments.Has("--text")) {
+    if (fwrite(text.data(), 1, text.size(), stdout) != text.size()) throw Failure("standard output cannot be written");
+  } else if (arguments.Has("--json")) {
+    if (!text.empty()) documents[0][kTextField] = text;
+    (void)printf("%s\n", ToScriptJson(documents[0]).c_str());
+  } else {
+    PrintDocument(documents[0], text);
+  }
+  return true;
+}
+
+void PrintUnread(const Json::Value& document, bool json) {
+  if (!json) {
+    (void)printf("%s\n    %s\n", EscapeForTerminal(TextOf(document, kPathField)).c_str(),
+                 EscapeOneLine(TextOf(document, kErrorField)).c_str());
+    return;
+  }
+  Json::Value line;
+  line["path"] = document[kPathField];
+  line["reason"] = document[kErrorField];
+  line["reader_version"] = Json::Int64(IntOf(document, kVersionField));
+  (void)printf("%s\n", ToScriptJson(line).c_str());
+}
+
+uint64_t ListUnread(const std::string& share, bool json) {
+  uint64_t count = 0;
+  Json::Value query;
+  query["qsl"]["unread"] = true;
+  query["limit"] = kPageEntries;
+  for (const char* field : {kPathField, kErrorField, kVersionField}) query["load_field"].append(field);
+  while (true) {
+    const Json::Value page = Entries(share, query);
+    for (const Json::Value& document : page) PrintUnread(document, json);
+    count += page.size();
+    if (page.size() < static_cast<Json::ArrayIndex>(kPageEntries)) return count;
+    query["after"] = page[page.size() - 1][kPathField];
+  }
+}
+
+}  // namespace
+
+int RunShow(const Arguments& arguments) {
+  bool all = true;
+  for (const std::string& file : arguments.words) all = Show(file, arguments) && all;
+  return all ? kDone : kNothingFound;
+}
+
+int RunUnread(const Arguments& arguments) {
+  uint64_t count = 0;
+  for (const std::string& share : IndexedShares(arguments.words)) count += ListUnread(share, arguments.Has("--json"));
+  if (fflush(stdout) != 0) throw Failure("standard output cannot be written");
+  (void)fprintf(stderr, "%s files could not be read, or not all of them\n", Count(count).c_str());
+  return kDone;
+}
+
+}  // namespace ferrox::cli
