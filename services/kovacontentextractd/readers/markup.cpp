@@ -15,7 +15,7 @@ namespace {
 using namespace std::literals;
 
 constexpr size_t kTitleMaxBytes = 1024;
-constexpr size_t kAttributeMaxBytes = 64 * 1024;  // a quote that is not closed within this is no quote
+constexpr size_t kAttributeMaxBytes = 64 * 1024;
 constexpr size_t kReferenceMaxBytes = 32;
 constexpr size_t kNotFound = std::string_view::npos;
 
@@ -213,8 +213,10 @@ class Reader {
     Enter(std::string_view(lower.data(), name.size()), closing, empty_element);
   }
 
-  /// Passes the attributes and the ">"; whether a "/" stood before it.
+  /// Passes the attributes and the ">"; whether a "/" stood before it. Only behind a "=" does a quote begin a value: an
+  /// apostrophe elsewhere is a mistake of its writer, or a part of a value without quotes.
   bool SkipAttributes() {
+    char before = '\0';
     while (at_ < source_.size()) {
       const char c = source_[at_];
       if (c == '>') {
@@ -223,11 +225,17 @@ class Reader {
       }
       if (c == '<' && !html_) return false;  // the tag was not closed; the next one begins here
       ++at_;
-      if (c != '"' && c != '\'') continue;
-      const size_t close = (c == '"' ? next_double_ : next_single_).Find(source_, at_);
-      if (close - at_ <= kAttributeMaxBytes && close < source_.size()) at_ = close + 1;
+      if (before == '=' && (c == '"' || c == '\'')) SkipQuoted(c);
+      if (!IsBlank(c)) before = c;
     }
     return false;
+  }
+
+  /// A quote that is not closed within a reasonable length is none, unless the value is a whole file.
+  void SkipQuoted(char quote) {
+    const size_t close = (quote == '"' ? next_double_ : next_single_).Find(source_, at_);
+    const bool is_file = StartsWithNoCase(source_.substr(at_), "data:"sv);
+    if (close < source_.size() && (is_file || close - at_ <= kAttributeMaxBytes)) at_ = close + 1;
   }
 
   void Enter(std::string_view name, bool closing, bool empty_element) {

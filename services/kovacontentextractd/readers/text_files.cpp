@@ -13,8 +13,9 @@ namespace ferrox::extract {
 
 namespace {
 
-/// How much of a file is read. Markup and UTF-16 hold less text than they have bytes.
+/// How much of a file is read. UTF-16 holds less text than it has bytes, and a saved page may hold its pictures.
 constexpr size_t kReadMaxBytes = 2U << 20;
+constexpr size_t kMarkupMaxBytes = 16U << 20;
 /// How much of a file that is no text is looked at to tell what it is.
 constexpr size_t kMagicBytes = 64U << 10;
 
@@ -26,20 +27,20 @@ struct Head {
 };
 
 /// Reads the beginning of the file, which may have grown since its size was taken.
-bool ReadHead(const Source& source, Head& head) {
-  size_t wanted = static_cast<size_t>(std::min<uint64_t>(source.size, kReadMaxBytes)) + 1;
+bool ReadHead(const Source& source, size_t max_bytes, Head& head) {
+  size_t wanted = static_cast<size_t>(std::min<uint64_t>(source.size, max_bytes)) + 1;
   size_t have = 0;
-  while (have <= kReadMaxBytes) {
+  while (have <= max_bytes) {
     head.bytes.resize(wanted);
     const ssize_t got = pread(source.fd, head.bytes.data() + have, wanted - have, static_cast<off_t>(have));
     if (got < 0 && errno == EINTR) continue;
     if (got < 0) return false;
     if (got == 0) break;
     have += static_cast<size_t>(got);
-    if (have == wanted) wanted = std::min(wanted * 2, kReadMaxBytes + 1);
+    if (have == wanted) wanted = std::min(wanted * 2, max_bytes + 1);
   }
-  head.cut = have > kReadMaxBytes;
-  head.bytes.resize(std::min(have, kReadMaxBytes));
+  head.cut = have > max_bytes;
+  head.bytes.resize(std::min(have, max_bytes));
   return true;
 }
 
@@ -67,7 +68,8 @@ bool AddDecoded(const Head& head, DeclaredEncoding declared, Markup markup, Find
 
 void ReadText(const Source& source, DeclaredEncoding declared, Markup markup, Findings& findings) {
   Head head;
-  if (!ReadHead(source, head)) return findings.Fail("cannot be read");
+  const size_t max_bytes = markup != nullptr ? kMarkupMaxBytes : kReadMaxBytes;
+  if (!ReadHead(source, max_bytes, head)) return findings.Fail("cannot be read");
   if (!head.bytes.empty() && !AddDecoded(head, declared, markup, findings)) findings.Fail("not text");
 }
 
@@ -95,7 +97,7 @@ void ReadXmlFile(const Source& source, Findings& findings) {
 
 void ReadUnknownFile(const Source& source, Findings& findings) {
   Head head;
-  if (!ReadHead(source, head)) return findings.Fail("cannot be read");
+  if (!ReadHead(source, kReadMaxBytes, head)) return findings.Fail("cannot be read");
   if (head.bytes.empty()) return;
   if (AddDecoded(head, &DeclaresNothing, nullptr, findings)) return findings.Set("KOVAMDContentType", "text/plain");
   const std::string type = TypeByMagic(head.bytes);
