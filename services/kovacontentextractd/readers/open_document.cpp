@@ -1,6 +1,10 @@
 #include "services/kovacontentextractd/readers/open_document.h"
 
+#include <algorithm>
+#include <iterator>
 #include <memory>
+#include <string>
+#include <vector>
 
 #include "services/kovacontentextractd/readers/property_fields.h"
 #include "services/kovacontentextractd/readers/times.h"
@@ -43,15 +47,35 @@ void AddBlank(std::string_view name, Findings& findings) {
   if (name == "line-break") findings.Break();
 }
 
-/// Collects the text of paragraphs, with a row of a table in a line.
+bool IsParagraph(std::string_view name) { return name == "p" || name == "h"; }
+
+/// Stands in the midst of a paragraph, even of a word, and is not of it: notes and their marks, comments with their
+/// authors, how to pronounce a word, the name of a picture.
+bool IsAside(std::string_view name) {
+  static constexpr std::string_view kAsides[] = {"note",      "note-citation", "annotation", "creator",    "date",
+                                                 "ruby-text", "title",         "desc",       "date-string"};
+  return std::find(std::begin(kAsides), std::end(kAsides), name) != std::end(kAsides);
+}
+
+/// Text that no paragraph is around: what a slide shows at its edges, the names of pictures.
+bool IsBare(std::string_view name) {
+  return name == "footer-decl" || name == "header-decl" || name == "title" || name == "desc";
+}
+
+bool IsPageEdge(std::string_view name) { return name.starts_with("header") || name.starts_with("footer"); }
+
+/// Collects the text of paragraphs, with a row of a table in a line: of a whole part, or of the headers and footers in
+/// it.
 class ContentReader {
  public:
-  ContentReader(ByteSource& content, Findings& findings) : xml_(content), findings_(findings) {}
+  enum Part { kAll, kPageEdges };
+  ContentReader(ByteSource& content, Part part, Findings& findings)
+      : xml_(content), findings_(findings), wanted_(part == kAll ? 1 : 0) {}
 
   void Read() {
     for (Token token; xml_.Next(token);) {
       if (token == Token::kText) {
-        if (paragraphs_ > 0 && !findings_.AddText(xml_.Text())) return;
+        if (paragraphs_ > 0 && wanted_ > 0 && !findings_.AddText(xml_.Text())) return;
       } else if (token == Token::kOpen) {
         Open(xml_.Name());
       } else {
@@ -60,11 +84,15 @@ class ContentReader {
     }
   }
 
+  /// The members of the objects that the text embeds, for example charts.
+  const std::vector<std::string>& Objects() const { return objects_; }
+
  private:
-  static bool IsParagraph(std::string_view name) { return name == "p" || name == "h"; }
+  static constexpr size_t kObjectsMax = 1000;
 
   void Open(std::string_view name) {
-    if (IsParagraph(name)) {
+    if (IsPageEdge(name)) ++wanted_;
+    if (IsParagraph(name) || IsBare(name)) {
       if (paragraphs_++ > 0) findings_.Break();
     } else if (name == "automatic-styles" || name == "tracked-changes" || name == "binary-data") {
       xml_.SkipElement();
@@ -73,13 +101,16 @@ class ContentReader {
       findings_.Break();
     } else if (name == "table-cell") {
       ++cells_;
+    } else if (name == "object") {
+      AddObject(xml_.PrefixedAttribute("href"));
     } else if (paragraphs_ > 0) {
-      AddBlank(name, findings_);
+      IsAside(name) ? findings_.Break() : AddBlank(name, findings_);
     }
   }
 
   void Close(std::string_view name) {
-    if (IsParagraph(name)) {
+    if (IsPageEdge(name)) --wanted_;
+    if (IsParagraph(name) || IsBare(name)) {
       --paragraphs_;
       if (cells_ > 0 && paragraphs_ == 0) {
         (void)findings_.AddText("\t");
@@ -88,13 +119,20 @@ class ContentReader {
       }
     } else if (name == "table-cell") {
       --cells_;
-    } else if (name == "table-row") {
+    } else if (name == "table-row" || (paragraphs_ > 0 && IsAside(name))) {
       findings_.Break();
     }
   }
 
+  void AddObject(std::string_view address) {
+    if (address.starts_with("./")) address.remove_prefix(2);
+    if (!address.empty() && objects_.size() < kObjectsMax) objects_.push_back(std::string(address) + "/content.xml");
+  }
+
   XmlTokenizer xml_;
   Findings& findings_;
+  std::vector<std::string> objects_;
+  int wanted_;          ///< more than 0 where text is taken
   int paragraphs_ = 0;  ///< a paragraph may hold others: notes, text in drawings
   int cells_ = 0;
 };
@@ -112,7 +150,16 @@ void ReadOpenDocument(const Source& source, Findings& findings) {
   }
   const std::unique_ptr<ByteSource> content = zip.Open("content.xml");
   if (content == nullptr) return findings.Fail("damaged");
-  ContentReader(*content, findings).Read();
+  ContentReader reader(*content, ContentReader::kAll, findings);
+  reader.Read();
+  for (const std::string& object : reader.Objects()) {
+    if (const auto chart = zip.Open(object)) ContentReader(*chart, ContentReader::kAll, findings).Read();
+  }
+  // The headers and footers of sheets and slides are mostly what the program put there.
+  const bool is_text = zip.ReadMember("mimetype", 100).find(".text") != std::string::npos;
+  if (const auto styles = is_text ? zip.Open("styles.xml") : nullptr) {
+    ContentReader(*styles, ContentReader::kPageEdges, findings).Read();
+  }
 }
 
 }  // namespace ferrox::extract
