@@ -57,6 +57,15 @@ constexpr PropertyField kApplicationFields[] = {
     {"Slides", "KOVAMDNumberOfPages", PropertyField::kCount},
 };
 
+/// What the writer says a picture shows. It may stand in the midst of a word.
+void AddDescription(const XmlTokenizer& xml, Findings& findings) {
+  const std::string_view description = xml.Attribute("descr");
+  if (description.empty()) return;
+  findings.Break();
+  (void)findings.AddText(description);
+  findings.Break();
+}
+
 }  // namespace
 
 std::vector<Relation> ReadRelations(ZipContainer& zip, std::string_view part) {
@@ -99,19 +108,32 @@ bool AddParagraphs(ZipContainer& zip, std::string_view part, Findings& findings)
       continue;
     }
     const std::string_view name = xml.Name();
-    if (name == "t") {
+    if (name == "t" || name == "v" || name == "text") {  // names in charts; comments on slides
       in_text = token == Token::kOpen;
+      if (!in_text && name != "t") findings.Break();
     } else if (token == Token::kClose) {
       if (name == "p") findings.Break();
-    } else if (name == "pPr" || name == "rPr" || name == "Fallback") {
-      xml.SkipElement();  // tab stops; the same again for programs that know less
+    } else if (name == "pPr" || name == "rPr" || name == "Fallback" || name == "numCache") {
+      xml.SkipElement();  // tab stops; the same again for programs that know less; a chart's points
     } else if (name == "br" || name == "cr") {
       findings.Break();
     } else if (name == "tab" || name == "noBreakHyphen") {
       (void)findings.AddText(name == "tab" ? "\t" : "-");
+    } else if (name == "docPr" || name == "cNvPr") {
+      AddDescription(xml, findings);
     }
   }
   findings.Break();
+  return true;
+}
+
+bool AddRelated(ZipContainer& zip, const std::vector<Relation>& relations,
+                std::initializer_list<std::string_view> types, Findings& findings) {
+  for (const std::string_view type : types) {
+    for (const Relation& relation : relations) {
+      if (relation.type == type && !AddParagraphs(zip, relation.target, findings)) return false;
+    }
+  }
   return true;
 }
 

@@ -1,5 +1,6 @@
 #pragma once
 
+#include <initializer_list>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -24,6 +25,9 @@ std::string TargetByType(const std::vector<Relation>& relations, std::string_vie
 
 /// Adds the text of a part's paragraphs. False when the findings take no more.
 bool AddParagraphs(ZipContainer& zip, std::string_view part, Findings& findings);
+/// Adds that of the parts which relations of these types point to, type by type.
+bool AddRelated(ZipContainer& zip, const std::vector<Relation>& relations,
+                std::initializer_list<std::string_view> types, Findings& findings);
 
 /// Sets title, authors, keywords and the like from the parts that the container names for them.
 void AddProperties(ZipContainer& zip, const std::vector<Relation>& relations, Findings& findings);

@@ -17,9 +17,9 @@ std::vector<std::string> SlideIds(ZipContainer& zip, const std::string& part) {
   if (member == nullptr) return ids;
   XmlTokenizer xml(*member);
   for (Token token; xml.Next(token);) {
-    if (token == Token::kOpen && xml.Name() == "sldId" && ids.size() < kSlidesMax) {
-      ids.emplace_back(xml.PrefixedAttribute("id"));
-    }
+    if (token != Token::kOpen || xml.Name() != "sldId" || ids.size() == kSlidesMax) continue;
+    const std::string_view id = xml.PrefixedAttribute("id");
+    if (!id.empty()) ids.emplace_back(id);  // sections list the same slides again, by numbers
   }
   return ids;
 }
@@ -34,11 +34,8 @@ void ReadPresentation(ZipContainer& zip, const std::string& part, Findings& find
     const std::string slide = TargetById(relations, id);
     if (slide.empty()) continue;
     if (!AddParagraphs(zip, slide, findings)) return;
-    for (const Relation& relation : ReadRelations(zip, slide)) {
-      const bool wanted =
-          relation.type == "notesSlide" || relation.type == "comments" || relation.type == "diagramData";
-      if (wanted && !AddParagraphs(zip, relation.target, findings)) return;
-    }
+    if (!AddRelated(zip, ReadRelations(zip, slide), {"notesSlide", "comments", "diagramData", "chart"}, findings))
+      return;
   }
 }
 

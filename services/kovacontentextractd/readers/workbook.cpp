@@ -151,10 +151,10 @@ void ReadWorkbook(ZipContainer& zip, const std::string& part, Findings& findings
     SheetReader reader(workbook, findings);
     if (!ForEachToken(zip, sheet, [&](XmlTokenizer& xml, Token token) { return reader.Take(xml, token); })) return;
     findings.Break();
-    for (const Relation& relation : ReadRelations(zip, sheet)) {
-      const bool wanted = relation.type == "comments" || relation.type == "drawing";
-      if (wanted && !AddParagraphs(zip, relation.target, findings)) return;
-    }
+    const std::vector<Relation> beside = ReadRelations(zip, sheet);
+    if (!AddRelated(zip, beside, {"comments", "drawing"}, findings)) return;
+    const std::string drawing = TargetByType(beside, "drawing");
+    if (!drawing.empty() && !AddRelated(zip, ReadRelations(zip, drawing), {"chart"}, findings)) return;
   }
 }
 
