@@ -19,6 +19,7 @@ std::string NameOf(int code_page) {
   switch (code_page) {
     case 437:
     case 850:
+      return "IBM850";
     case 852:
       return "IBM852";
     case 855:
@@ -38,6 +39,17 @@ std::string NameOf(int code_page) {
       return "BIG5-HKSCS";
     case 1361:
       return "JOHAB";
+    case 10000:
+    case 32768:
+      return "MACINTOSH";
+    case 10001:
+      return "CP932";
+    case 10002:
+      return "BIG5-HKSCS";
+    case 10003:
+      return "UHC";
+    case 10008:
+      return "GB18030";
     case 10007:
       return "MAC-CYRILLIC";
     case 20866:

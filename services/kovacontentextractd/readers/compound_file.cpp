@@ -13,6 +13,7 @@ constexpr std::string_view kMark = "\xD0\xCF\x11\xE0\xA1\xB1\x1A\xE1";
 constexpr size_t kHeaderBytes = 512;
 constexpr uint32_t kLastSector = 0xFFFFFFFA;  ///< numbers beyond it have other meanings: end, free
 constexpr size_t kEntryBytes = 128;
+constexpr uint8_t kStorageType = 1, kStreamType = 2;
 constexpr size_t kEntriesMax = 65536;
 constexpr uint64_t kTableMax = 8U << 20;  ///< sectors: a file of 4 GiB
 
@@ -112,28 +113,59 @@ void CompoundFile::ReadMiniTable(uint32_t first) {
 }
 
 void CompoundFile::ReadEntries(uint32_t first) {
-  constexpr uint8_t kRoot = 5, kStream = 2;
   for (const uint32_t sector : Chain(table_, first)) {
     const std::string bytes = ReadSector(sector);
-    for (size_t at = 0; at + kEntryBytes <= bytes.size(); at += kEntryBytes) {
+    for (size_t at = 0; at + kEntryBytes <= bytes.size() && entries_.size() < kEntriesMax; at += kEntryBytes) {
       const std::string_view entry = std::string_view(bytes).substr(at, kEntryBytes);
       const size_t name_bytes = std::min<size_t>(Little16(entry, 64), 64);
-      const std::string name = FromUtf16Little(entry.substr(0, name_bytes < 2 ? 0 : name_bytes - 2));
-      const uint32_t start = Little32(entry, 116);
-      const uint64_t size = Little32(entry, 120);  // bigger ones are not office files
-      const auto type = static_cast<uint8_t>(entry[66]);
-      if (type == kRoot && mini_stream_.sectors_.empty()) {
-        mini_stream_.sectors_ = Chain(table_, start);
-        mini_stream_.size_ = std::min<uint64_t>(size, uint64_t{mini_stream_.sectors_.size()} << sector_shift_);
-      } else if (type == kStream && entries_.size() < kEntriesMax) {
-        entries_.push_back({name, start, size});
-      }
+      Entry& added = entries_.emplace_back();
+      added.name = FromUtf16Little(entry.substr(0, name_bytes < 2 ? 0 : name_bytes - 2));
+      added.type = static_cast<uint8_t>(entry[66]);
+      added.left = Little32(entry, 68);
+      added.right = Little32(entry, 72);
+      added.child = Little32(entry, 76);
+      added.first_sector = Little32(entry, 116);
+      added.size = Little32(entry, 120);  // bigger ones are not office files
     }
+  }
+  if (entries_.empty()) return;
+  const Entry& root = entries_.front();
+  mini_stream_.sectors_ = Chain(table_, root.first_sector);
+  mini_stream_.size_ = std::min<uint64_t>(root.size, uint64_t{mini_stream_.sectors_.size()} << sector_shift_);
+  FindParents();
+}
+
+/// What no storage holds, because the tree is damaged, counts as the root's.
+void CompoundFile::FindParents() {
+  std::vector<std::pair<uint32_t, uint32_t>> open = {{entries_.front().child, kRoot}};
+  while (!open.empty()) {
+    const auto [number, parent] = open.back();
+    open.pop_back();
+    if (number == kRoot || number >= entries_.size() || entries_[number].parent != kNoParent) continue;
+    Entry& entry = entries_[number];
+    entry.parent = parent;
+    open.insert(open.end(), {{entry.left, parent}, {entry.right, parent}});
+    if (entry.type == kStorageType) open.emplace_back(entry.child, number);
+  }
+  for (Entry& entry : entries_) {
+    if (entry.parent == kNoParent) entry.parent = kRoot;
   }
 }
 
-std::unique_ptr<CompoundStream> CompoundFile::Open(std::string_view name) const {
-  const auto found = std::find_if(entries_.begin(), entries_.end(), [&](const Entry& e) { return e.name == name; });
+std::vector<uint32_t> CompoundFile::Storages(std::string_view begin) const {
+  std::vector<uint32_t> found;
+  for (size_t i = 1; i < entries_.size(); ++i) {
+    const Entry& entry = entries_[i];
+    const bool wanted = entry.type == kStorageType && entry.parent == kRoot && entry.name.starts_with(begin);
+    if (wanted) found.push_back(static_cast<uint32_t>(i));
+  }
+  return found;
+}
+
+std::unique_ptr<CompoundStream> CompoundFile::Open(std::string_view name, uint32_t storage) const {
+  const auto found = std::find_if(entries_.begin(), entries_.end(), [&](const Entry& entry) {
+    return entry.type == kStreamType && entry.parent == storage && entry.name == name;
+  });
   if (found == entries_.end()) return nullptr;
   auto stream = std::make_unique<CompoundStream>();
   stream->file_ = this;

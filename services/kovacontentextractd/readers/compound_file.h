@@ -40,22 +40,31 @@ class CompoundFile {
   CompoundFile(const CompoundFile&) = delete;
   CompoundFile& operator=(const CompoundFile&) = delete;
   bool IsOpen() const { return open_; }
-  /// The first stream of this name, in whatever storage; null when there is none.
-  std::unique_ptr<CompoundStream> Open(std::string_view name) const;
+  /// A storage: the root, which is where a program keeps its own document, or a number that Storages has given.
+  static constexpr uint32_t kRoot = 0;
+  /// The stream of this name in a storage; null when there is none.
+  std::unique_ptr<CompoundStream> Open(std::string_view name, uint32_t storage = kRoot) const;
+  /// The storages in the root whose names begin so.
+  std::vector<uint32_t> Storages(std::string_view begin) const;
 
  private:
   friend class CompoundStream;
   struct Entry {
     std::string name;
-    uint32_t first_sector;
-    uint64_t size;
+    uint8_t type = 0;
+    uint32_t left = 0, right = 0, child = 0;  ///< a storage holds a tree of entries, by their numbers
+    uint32_t first_sector = 0;
+    uint64_t size = 0;
+    uint32_t parent = kNoParent;
   };
+  static constexpr uint32_t kNoParent = UINT32_MAX;
 
   uint64_t SectorOffset(uint32_t sector) const { return (uint64_t{sector} + 1) << sector_shift_; }
   std::vector<uint32_t> Chain(const std::vector<uint32_t>& table, uint32_t first) const;
   void ReadSectorTable(const std::string& header);
   void ReadMiniTable(uint32_t first);
   void ReadEntries(uint32_t first);
+  void FindParents();
   void AppendTable(uint32_t sector, std::vector<uint32_t>& table) const;
   std::string ReadSector(uint32_t sector) const;
 

@@ -311,8 +311,9 @@ void LoadConverters() {
       "WINDOWS-1250", "WINDOWS-1251", "WINDOWS-1252", "WINDOWS-1253", "WINDOWS-1254", "WINDOWS-1255", "WINDOWS-1256",
       "WINDOWS-1257", "WINDOWS-1258", "WINDOWS-874",  "ISO-8859-2",   "ISO-8859-3",   "ISO-8859-4",   "ISO-8859-5",
       "ISO-8859-6",   "ISO-8859-7",   "ISO-8859-8",   "ISO-8859-10",  "ISO-8859-13",  "ISO-8859-15",  "ISO-8859-16",
-      "KOI8-U",       "IBM852",       "IBM855",       "IBM866",       "MAC-CYRILLIC", "GB18030",      "CP932",
-      "EUC-JP",       "ISO-2022-JP",  "UHC",          "ISO-2022-KR",  "JOHAB",        "BIG5-HKSCS",   "EUC-TW"};
+      "KOI8-U",       "IBM850",       "IBM852",       "IBM855",       "IBM866",       "MACINTOSH",    "MAC-CYRILLIC",
+      "GB18030",      "CP932",        "EUC-JP",       "ISO-2022-JP",  "UHC",          "ISO-2022-KR",  "JOHAB",
+      "BIG5-HKSCS",   "EUC-TW"};
   for (const char* encoding : kInUse) HoldConverter(encoding, "UTF-8");
 }
 

@@ -14,6 +14,9 @@ namespace ferrox::extract {
 namespace {
 
 enum RecordType : uint16_t {
+  kBof2 = 0x0009,  // of Excel 2, and what follows it: of 3 and 4
+  kBof3 = 0x0209,
+  kBof4 = 0x0409,
   kBof = 0x0809,
   kFilePass = 0x002F,
   kCodePage = 0x0042,
@@ -29,7 +32,16 @@ enum RecordType : uint16_t {
   kShortNumber = 0x027E,
   kShortNumbers = 0x00BD,
   kFormula = 0x0006,
+  kFormula3 = 0x0206,
+  kFormula4 = 0x0406,
   kFormulaText = 0x0207,
+  kFormulaText2 = 0x0007,
+  kInteger2 = 0x0002,
+  kNumber2 = 0x0003,
+  kLabel2 = 0x0004,
+  kNote = 0x001C,
+  kTextObject = 0x01B6,
+  kSeriesText = 0x100D,
 };
 constexpr uint16_t kBiff8 = 0x0600;
 constexpr size_t kStylesMax = 65536;
@@ -37,7 +49,7 @@ constexpr size_t kStylesMax = 65536;
 /// The records of a workbook, one at a time.
 class Records {
  public:
-  explicit Records(CompoundStream& stream) : stream_(stream) {}
+  explicit Records(ByteSource& stream) : stream_(stream) {}
 
   bool Next() {
     std::string header(4, '\0');
@@ -51,7 +63,7 @@ class Records {
   std::string_view Content() const { return content_; }
 
  private:
-  CompoundStream& stream_;
+  ByteSource& stream_;
   uint16_t type_ = 0;
   std::string content_;
 };
@@ -136,12 +148,13 @@ class SharedTexts {
 
 class WorkbookReader {
  public:
-  WorkbookReader(CompoundStream& stream, Findings& findings) : records_(stream), findings_(findings) {}
+  WorkbookReader(ByteSource& stream, Findings& findings) : records_(stream), findings_(findings) {}
 
   void Read() {
     bool have = records_.Next();
-    if (!have || records_.Type() != kBof) return findings_.Fail("damaged");
-    biff8_ = Little16(records_.Content(), 0) == kBiff8;
+    if (!have || !IsBegin(records_.Type())) return findings_.Fail("damaged");
+    biff8_ = records_.Type() == kBof && Little16(records_.Content(), 0) == kBiff8;
+    cell_bytes_ = records_.Type() == kBof2 ? 7 : 6;
     while (have) {
       if (records_.Type() == kSharedTexts && biff8_) {
         have = SharedTexts(records_, findings_).Add();
@@ -173,19 +186,58 @@ class WorkbookReader {
       case kLabel:
       case kRichLabel:
         return AddCell(record, Text(record, 6, 2));
+      case kLabel2:
+        return AddCell(record, Text(record, 7, 1));
       case kFormulaText:
-        return AddCell(record, Text(record, 0, 2));
+        return AddInRow(row_, Text(record, 0, 2));
+      case kFormulaText2:
+        return AddInRow(row_, Text(record, 0, 1));
+      case kInteger2:
+        return AddNumber(record, Little16(record, 7));
       case kNumber:
-        return AddNumber(record, Double(record, 6));
+      case kNumber2:
+        return AddNumber(record, Double(record, cell_bytes_));
       case kShortNumber:
         return AddNumber(record, Short(Little32(record, 6)));
       case kShortNumbers:
         return AddShortNumbers(record);
       case kFormula:
-        return Little16(record, 12) == 0xFFFF || AddNumber(record, Double(record, 6));
+      case kFormula3:
+      case kFormula4:
+        return TakeFormula(record);
+      case kNote:
+        return biff8_ || AddLine(Text(record, 4, 2));
+      case kSeriesText:
+        return AddLine(Text(record, 2, 1));
+      case kTextObject:
+        object_characters_ = Little16(record, 10);
+        return true;
+      case kContinue:
+        return AddObjectText(record);
       default:
         return true;
     }
+  }
+
+  static bool IsBegin(uint16_t type) { return type == kBof2 || type == kBof3 || type == kBof4 || type == kBof; }
+
+  /// A result that is a text follows in a record of its own.
+  bool TakeFormula(std::string_view record) {
+    const bool is_number = Little16(record, cell_bytes_ + 6) != 0xFFFF;
+    if (is_number) return AddNumber(record, Double(record, cell_bytes_));
+    row_ = Little16(record, 0);
+    return true;
+  }
+
+  /// A comment or the text of a drawing stands in the records behind it, each with a byte that tells its width.
+  bool AddObjectText(std::string_view record) {
+    if (object_characters_ == 0 || record.empty()) return true;
+    const size_t width = (record[0] & 1) != 0 ? 2 : 1;
+    const std::string_view bytes = record.substr(1, object_characters_ * width);
+    object_characters_ -= std::min(object_characters_, std::max<size_t>(1, bytes.size() / width));
+    const bool more = findings_.AddText(width == 2 ? FromUtf16Little(bytes) : FromCodePage(bytes, 1252));
+    if (object_characters_ == 0) findings_.Break();
+    return more;
   }
 
   bool TakeFormat(std::string_view record) {
@@ -240,9 +292,7 @@ class WorkbookReader {
     return AddInRow(row, NumberText(value, is_date, from_1904_));
   }
 
-  bool AddCell(std::string_view record, const std::string& text) {
-    return AddInRow(records_.Type() == kFormulaText ? row_ : Little16(record, 0), text);
-  }
+  bool AddCell(std::string_view record, const std::string& text) { return AddInRow(Little16(record, 0), text); }
 
   bool AddInRow(uint16_t row, const std::string& text) {
     if (row != row_) findings_.Break();
@@ -251,6 +301,7 @@ class WorkbookReader {
   }
 
   bool AddLine(const std::string& text) {
+    findings_.Break();
     const bool more = findings_.AddText(text);
     findings_.Break();
     return more;
@@ -262,12 +313,14 @@ class WorkbookReader {
   bool from_1904_ = false;
   int code_page_ = 1252;
   uint16_t row_ = 0;
+  size_t cell_bytes_ = 6;         ///< before a cell's value: its row, column and style
+  size_t object_characters_ = 0;  ///< of a drawing's text that are still to come
   std::set<int> date_formats_;
   std::vector<bool> style_is_date_;
 };
 
 }  // namespace
 
-void ReadOldExcel(CompoundStream& book, Findings& findings) { WorkbookReader(book, findings).Read(); }
+void ReadOldExcel(ByteSource& book, Findings& findings) { WorkbookReader(book, findings).Read(); }
 
 }  // namespace ferrox::extract

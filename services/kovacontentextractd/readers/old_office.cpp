@@ -6,7 +6,10 @@ namespace ferrox::extract {
 
 void ReadOldOffice(const Source& source, Findings& findings) {
   const CompoundFile file(source);
-  if (!file.IsOpen()) return findings.Fail("damaged");
+  if (!file.IsOpen()) {
+    FileSource bare(source);  // a workbook from before there were compound files, or damaged
+    return ReadOldExcel(bare, findings);
+  }
   AddSummaryInformation(file, findings);
   if (file.Open("WordDocument") != nullptr) return ReadOldWord(file, findings);
   for (const char* name : {"Workbook", "Book"}) {

@@ -10,7 +10,7 @@ void AddSummaryInformation(const CompoundFile& file, Findings& findings);
 
 void ReadOldWord(const CompoundFile& file, Findings& findings);
 /// `book` is the stream with the workbook.
-void ReadOldExcel(CompoundStream& book, Findings& findings);
+void ReadOldExcel(ByteSource& book, Findings& findings);
 void ReadOldPowerPoint(const CompoundFile& file, Findings& findings);
 void ReadOutlookMessage(const CompoundFile& file, Findings& findings);
 

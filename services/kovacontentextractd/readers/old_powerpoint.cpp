@@ -10,7 +10,16 @@ namespace ferrox::extract {
 
 namespace {
 
-enum RecordType : uint16_t { kMainMaster = 0x03F8, kHandout = 0x0FC9, kTextUtf16 = 0x0FA0, kTextBytes = 0x0FA8 };
+enum RecordType : uint16_t {
+  kMainMaster = 0x03F8,
+  kHandout = 0x0FC9,
+  kTextUtf16 = 0x0FA0,
+  kTextBytes = 0x0FA8,
+  kName = 0x0FBA,  ///< a short text; most are the program's own
+  kHeadersFooters = 0x0FD9,
+  kExtension = 0x138B,  ///< holds what later versions of the program added, comments among it
+  kComment = 0x2EE0,
+};
 constexpr size_t kTextMaxBytes = 1U << 20;
 
 bool IsEncrypted(const CompoundFile& file) {
@@ -35,28 +44,60 @@ std::string FromLowBytes(std::string_view bytes) {
   return text;
 }
 
+/// Records hold records; those that hold others have 15 in the low bits of their first number. Some that have hold
+/// something else, so what is read in a record ends with it, whatever its own records claim.
+class SlideReader {
+ public:
+  SlideReader(CompoundStream& stream, Findings& findings) : stream_(stream), findings_(findings) {}
+
+  /// Up to a place in the stream. False when the findings take no more.
+  bool Read(uint64_t end) {
+    std::string header(kHeaderBytes, '\0');
+    while (At() + kHeaderBytes <= end && stream_.Read(header.data(), kHeaderBytes) == kHeaderBytes) {
+      const uint64_t record_end = At() + std::min<uint64_t>(Little32(header, 4), end - At());
+      if (!Take(Little16(header, 2), (Little16(header, 0) & 0x0F) == 0x0F, record_end)) return false;
+      stream_.Skip(record_end - std::min(record_end, At()));
+    }
+    return true;
+  }
+
+ private:
+  static constexpr size_t kHeaderBytes = 8;
+  static constexpr int kDepthMax = 32;
+
+  uint64_t At() const { return stream_.Size() - stream_.Left(); }
+
+  bool Take(uint16_t type, bool holds_others, uint64_t end) {
+    if (type == kComment || type == kHeadersFooters) names_end_ = end;
+    if (type == kTextUtf16 || type == kTextBytes || (type == kName && At() < names_end_)) {
+      return AddText(type, end - At());
+    }
+    const bool wanted = type == kExtension || (holds_others && type != kMainMaster && type != kHandout);
+    if (!wanted || depth_ == kDepthMax) return true;
+    ++depth_;
+    const bool more = Read(end);
+    --depth_;
+    return more;
+  }
+
+  bool AddText(uint16_t type, uint64_t size) {
+    std::string bytes(static_cast<size_t>(std::min<uint64_t>({size, stream_.Left(), kTextMaxBytes})), '\0');
+    bytes.resize(stream_.Read(bytes.data(), bytes.size()));
+    return AddLines(type == kTextBytes ? FromLowBytes(bytes) : FromUtf16Little(bytes), findings_);
+  }
+
+  CompoundStream& stream_;
+  Findings& findings_;
+  uint64_t names_end_ = 0;  ///< of the record in which short texts are some that people wrote
+  int depth_ = 0;
+};
+
 }  // namespace
 
-/// Records hold records; those that hold others have 15 in the low bits of their first number, and are walked into.
 void ReadOldPowerPoint(const CompoundFile& file, Findings& findings) {
-  constexpr size_t kHeaderBytes = 8;
   if (IsEncrypted(file)) return findings.Fail("encrypted");
   const auto stream = file.Open("PowerPoint Document");
-  std::string header(kHeaderBytes, '\0');
-  while (stream->Read(header.data(), kHeaderBytes) == kHeaderBytes) {
-    const uint16_t type = Little16(header, 2);
-    const uint32_t size = Little32(header, 4);
-    const bool holds_others = (Little16(header, 0) & 0x0F) == 0x0F;
-    if (holds_others && type != kMainMaster && type != kHandout) continue;
-    if (type != kTextUtf16 && type != kTextBytes) {
-      stream->Skip(size);
-      continue;
-    }
-    std::string bytes(std::min<uint64_t>({size, stream->Left(), kTextMaxBytes}), '\0');
-    bytes.resize(stream->Read(bytes.data(), bytes.size()));
-    stream->Skip(size - bytes.size());
-    if (!AddLines(type == kTextUtf16 ? FromUtf16Little(bytes) : FromLowBytes(bytes), findings)) return;
-  }
+  (void)SlideReader(*stream, findings).Read(stream->Size());
 }
 
 }  // namespace ferrox::extract

@@ -21,6 +21,7 @@ using namespace std::literals;
 constexpr size_t kDepthMax = 2000;
 constexpr size_t kFontsMax = 10000;
 constexpr size_t kPieceBytes = 32U << 10;
+constexpr int kMacRoman = 10000;
 
 /// Where text goes in a group.
 enum class Target : uint8_t { kText, kNowhere, kFontTable, kField };
@@ -87,7 +88,7 @@ constexpr NamedCharacter kCharacters[] = {
 /// The code page of a font's character set.
 int CodePageOf(int charset) {
   static constexpr std::array<std::pair<int, int>, 17> kCharsets = {{{0, 1252},
-                                                                     {77, 1252},
+                                                                     {77, kMacRoman},
                                                                      {128, 932},
                                                                      {129, 949},
                                                                      {130, 1361},
@@ -215,7 +216,7 @@ class RichTextReader {
       return;
     }
     if (word == "mac"sv || word == "pc"sv) {
-      ansi_code_page_ = Top().code_page = word == "pc"sv ? 437 : 1252;
+      ansi_code_page_ = Top().code_page = word == "pc"sv ? 437 : kMacRoman;
       return;
     }
     for (const NamedCharacter& character : kCharacters) {
