@@ -32,15 +32,16 @@ constexpr PropertyField kPackageFields[] = {
     {"date", "KOVAMDContentCreationDate", PropertyField::kTime},
 };
 
-/// The member that describes the book.
+/// The member that describes the book. The container may be packed with its folder, and then is not where it must be.
 std::string PackageName(ZipContainer& zip) {
-  const std::unique_ptr<ByteSource> container = zip.Open("META-INF/container.xml");
-  if (container == nullptr) return {};
-  XmlTokenizer xml(*container);
-  for (Token token; xml.Next(token);) {
-    if (token == Token::kOpen && xml.Name() == "rootfile") return std::string(xml.Attribute("full-path"));
+  if (const std::unique_ptr<ByteSource> container = zip.Open("META-INF/container.xml")) {
+    XmlTokenizer xml(*container);
+    for (Token token; xml.Next(token);) {
+      if (token == Token::kOpen && xml.Name() == "rootfile") return std::string(xml.Attribute("full-path"));
+    }
   }
-  return {};
+  const std::vector<std::string> names = zip.Names("", ".opf", 1);
+  return names.empty() ? std::string() : names.front();
 }
 
 /// An address in the package's description is a member's name with some characters as "%20".

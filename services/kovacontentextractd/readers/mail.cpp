@@ -6,6 +6,7 @@
 #include <gmime/gmime.h>
 #include <memory>
 #include <string>
+#include <utility>
 
 #include "services/kovacontentextractd/readers/byte_source.h"
 #include "services/kovacontentextractd/readers/encoding.h"
@@ -136,8 +137,8 @@ class MailReader {
   bool AddMultipart(GMimeMultipart* multipart, int level) {
     GMimeContentType* type = g_mime_object_get_content_type(GMIME_OBJECT(multipart));
     const int count = std::min(g_mime_multipart_get_count(multipart), kPartsMax);
-    if (g_mime_content_type_is_type(type, "multipart", "alternative") != FALSE && count > 0) {
-      return AddObject(BestAlternative(multipart, count), level + 1);
+    if (g_mime_content_type_is_type(type, "multipart", "alternative") != FALSE) {
+      if (GMimeObject* plain = PlainAlternative(multipart, count)) return AddAlternatives(multipart, plain, level);
     }
     for (int i = 0; i < count; ++i) {
       if (!AddObject(g_mime_multipart_get_part(multipart, i), level + 1)) return false;
@@ -145,14 +146,29 @@ class MailReader {
     return true;
   }
 
-  /// Of the same text in several forms, the plain one; else the last, which is the richest.
-  static GMimeObject* BestAlternative(GMimeMultipart* multipart, int count) {
+  static GMimeObject* PlainAlternative(GMimeMultipart* multipart, int count) {
     for (int i = 0; i < count; ++i) {
       GMimeObject* part = g_mime_multipart_get_part(multipart, i);
       GMimeContentType* type = g_mime_object_get_content_type(part);
       if (g_mime_content_type_is_type(type, "text", "plain") != FALSE) return part;
     }
-    return g_mime_multipart_get_part(multipart, count - 1);
+    return nullptr;
+  }
+
+  /// Of the same text in several forms, the plain one. Others may hold files beside it, and more text where the plain
+  /// one only says that there is another.
+  bool AddAlternatives(GMimeMultipart* multipart, GMimeObject* plain, int level) {
+    const size_t before = findings_.Text().size();
+    if (!AddObject(plain, level + 1)) return false;
+    const size_t outer = std::exchange(plain_bytes_, std::max<size_t>(1, findings_.Text().size() - before));
+    bool more = true;
+    const int count = std::min(g_mime_multipart_get_count(multipart), kPartsMax);
+    for (int i = 0; more && i < count; ++i) {
+      GMimeObject* part = g_mime_multipart_get_part(multipart, i);
+      if (part != plain) more = AddObject(part, level + 1);
+    }
+    plain_bytes_ = outer;
+    return more;
   }
 
   bool AddPart(GMimePart* part) {
@@ -168,6 +184,7 @@ class MailReader {
     if (g_mime_content_type_is_type(type, "text", "html") != FALSE) {
       decoded.text = ReadHtml(decoded.text, findings_.Bounds().text_bytes).text;
     }
+    if (plain_bytes_ > 0 && decoded.text.size() <= 2 * plain_bytes_) return true;
     const bool more = findings_.AddText(decoded.text);
     findings_.Break();
     return more;
@@ -203,7 +220,8 @@ class MailReader {
   bool is_box_;
   int depth_;
   int parts_ = 0;
-  std::string encoding_;  ///< of headers that are bytes outside ASCII and not UTF-8; empty for Latin-1
+  size_t plain_bytes_ = 0;  ///< of the plain form of what is read, where there is one; 0 where there is none
+  std::string encoding_;    ///< of headers that are bytes outside ASCII and not UTF-8; empty for Latin-1
 };
 
 }  // namespace
