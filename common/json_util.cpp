@@ -4,6 +4,7 @@
 #include <cerrno>
 #include <memory>
 #include <ostream>
+#include <sstream>
 #include <streambuf>
 
 #include <json/reader.h>
@@ -90,7 +91,12 @@ bool fromString(Json::Value& value, const std::string& text) {
   return false;
 }
 
-std::string toString(const Json::Value& value) { return Json::writeString(WriterBuilder(""), value); }
+std::string toString(const Json::Value& value) {
+  thread_local const std::unique_ptr<Json::StreamWriter> writer(WriterBuilder("").newStreamWriter());
+  std::ostringstream text;
+  (void)writer->write(value, &text);
+  return text.str();
+}
 
 bool fromFile(Json::Value& value, const std::string& path) {
   std::string text;

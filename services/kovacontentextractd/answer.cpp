@@ -73,10 +73,11 @@ bool ParseAnswer(const std::string& json, Json::Value& fields) {
   static const Types types = MakeTypes();
   Json::Value said;
   if (ValidUtf8Prefix(json) != json.size() || !fromString(said, json) || !said.isObject()) return false;
-  for (const auto& [name, type] : types) {
-    if (!said.isMember(name)) continue;
-    Json::Value value = OfType(type, said[name]);
-    if (!value.isNull()) fields[name] = std::move(value);
+  for (auto member = said.begin(); member != said.end(); ++member) {
+    const auto known = types.find(member.name());
+    if (known == types.end()) continue;
+    Json::Value value = OfType(known->second, *member);
+    if (!value.isNull()) fields[known->first] = std::move(value);
   }
   return true;
 }

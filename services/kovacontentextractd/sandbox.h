@@ -22,7 +22,7 @@ std::vector<std::string> CloseSandbox(const char* empty_folder);
 
 /// The CPU time that one file may take.
 inline constexpr int kCpuSecondsPerFile = 20;
-/// Starts to count it anew; 0 stops counting. The process is killed by SIGPROF when it is used up.
+/// Starts to count it anew. The process is killed by SIGPROF when it is used up.
 void LimitCpuTime(int limit_seconds);
 
 }  // namespace ferrox::extract

@@ -8,11 +8,15 @@
 #include <sys/syscall.h>
 #include <unistd.h>
 
+#include <array>
 #include <cerrno>
 #include <cstdlib>
 #include <cstring>
+#include <memory>
 #include <new>
+#include <sstream>
 #include <string>
+#include <string_view>
 
 #include <json/writer.h>
 
@@ -49,10 +53,15 @@ bool WriteAll(const void* from, size_t size) {
 }
 
 std::string ToText(const Json::Value& value) {
-  Json::StreamWriterBuilder builder;
-  builder["indentation"] = "";
-  builder["emitUTF8"] = true;
-  return Json::writeString(builder, value);
+  static const std::unique_ptr<Json::StreamWriter> writer = [] {
+    Json::StreamWriterBuilder builder;
+    builder["indentation"] = "";
+    builder["emitUTF8"] = true;
+    return std::unique_ptr<Json::StreamWriter>(builder.newStreamWriter());
+  }();
+  std::ostringstream text;
+  (void)writer->write(value, &text);
+  return text.str();
 }
 
 /// The file's text goes to the region, to which `region` points: through a socket it would be copied twice more.
@@ -70,25 +79,30 @@ struct Request {
   Source source;
 };
 
-/// The header and the descriptor that comes with it. False when the daemon has hung up, or makes no sense.
-bool ReceiveHeader(RequestHeader& header, int& fd) {
-  const ssize_t got = services::ReceiveWithDescriptors(kWorkerSocket, &header, sizeof(header), &fd, 1);
-  if (got <= 0 || fd < 0) return false;
-  return ReadAll(reinterpret_cast<char*>(&header) + got, sizeof(header) - static_cast<size_t>(got));
+/// Takes the next `size` bytes of a request. What has not come with its beginning is read.
+bool TakeText(std::string_view& come, size_t size, std::string& text) {
+  text = come.substr(0, size);
+  come.remove_prefix(text.size());
+  const size_t have = text.size();
+  text.resize(size);
+  return have == size || ReadAll(text.data() + have, size - have);
 }
 
+/// False when the daemon has hung up, or makes no sense.
 bool ReceiveRequest(Request& request) {
+  std::array<char, 1024> buffer;
   RequestHeader header;
-  if (!ReceiveHeader(header, request.source.fd)) return false;
+  const ssize_t got =
+      services::ReceiveWithDescriptors(kWorkerSocket, buffer.data(), buffer.size(), &request.source.fd, 1);
+  if (got < static_cast<ssize_t>(sizeof(header)) || request.source.fd < 0) return false;
+  memcpy(&header, buffer.data(), sizeof(header));
   request.number = header.number;
-  request.reader.resize(header.reader_bytes);
-  request.source.extension.resize(header.extension_bytes);
-  request.source.name.resize(header.name_bytes);
   struct stat info = {};
   if (fstat(request.source.fd, &info) == 0) request.source.size = static_cast<uint64_t>(info.st_size);
-  return ReadAll(request.reader.data(), request.reader.size()) &&
-         ReadAll(request.source.extension.data(), request.source.extension.size()) &&
-         ReadAll(request.source.name.data(), request.source.name.size());
+  std::string_view come(buffer.data() + sizeof(header), static_cast<size_t>(got) - sizeof(header));
+  return TakeText(come, header.reader_bytes, request.reader) &&
+         TakeText(come, header.extension_bytes, request.source.extension) &&
+         TakeText(come, header.name_bytes, request.source.name);
 }
 
 /// A reader gives its memory back on its way out, so that one greedy file does not cost the process.
@@ -121,9 +135,8 @@ int ReadFiles(const Worker& worker, const char* empty_folder, int region_fd) {
   bool connected = Answer(region, 0, greeting);
   for (Request request; connected && ReceiveRequest(request);) {
     Findings findings;
-    LimitCpuTime(kCpuSecondsPerFile);
+    LimitCpuTime(kCpuSecondsPerFile);  // what the last file has left does not run while nothing is done
     Read(worker, request, findings);
-    LimitCpuTime(0);
     (void)close(request.source.fd);
     connected = Answer(region, request.number, findings.ToFields(), findings.Text());
   }

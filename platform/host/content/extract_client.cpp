@@ -10,6 +10,7 @@
 #include <memory>
 #include <mutex>
 #include <optional>
+#include <sstream>
 #include <stdexcept>
 #include <string_view>
 #include <utility>
@@ -153,10 +154,15 @@ std::string RequestText(const std::string& path) {
   request["type"] = "extract";
   request["data"]["root"] = RootOf(path);
   request["data"]["path"] = path;
-  Json::StreamWriterBuilder builder;
-  builder["indentation"] = "";
-  builder["emitUTF8"] = true;
-  return Json::writeString(builder, request);
+  thread_local const std::unique_ptr<Json::StreamWriter> writer = [] {
+    Json::StreamWriterBuilder builder;
+    builder["indentation"] = "";
+    builder["emitUTF8"] = true;
+    return std::unique_ptr<Json::StreamWriter>(builder.newStreamWriter());
+  }();
+  std::ostringstream text;
+  (void)writer->write(request, &text);
+  return text.str();
 }
 
 /// The text of a file: in the memory, or behind the reply's JSON and a zero byte. False when there is not so much.
@@ -171,7 +177,7 @@ bool FindText(const std::string& reply, size_t json_bytes, const Json::Value& da
 
 bool ReadReply(const std::string& reply, Json::Value& json, std::string_view& text) try {
   const size_t json_bytes = std::min(reply.find('\0'), reply.size());
-  const std::unique_ptr<Json::CharReader> reader(Json::CharReaderBuilder().newCharReader());
+  thread_local const std::unique_ptr<Json::CharReader> reader(Json::CharReaderBuilder().newCharReader());
   if (!reader->parse(reply.data(), reply.data() + json_bytes, &json, nullptr) || !json.isObject()) return false;
   if (!json["success"].isBool() || json["data"].isObject() != json["success"].asBool()) return false;
   return FindText(reply, json_bytes, json["data"], text);

@@ -329,7 +329,7 @@ bool Decode(std::string_view bytes, bool cut, const std::string& declared, Decod
   }
   if (IsUtf8(bytes, cut)) {
     decoded.encoding = "UTF-8";
-    decoded.text = bytes.substr(0, ValidUtf8Prefix(bytes));
+    decoded.text = cut ? bytes.substr(0, ValidUtf8Prefix(bytes)) : bytes;
     return true;
   }
   if (DamagedUtf8(bytes, decoded)) return true;

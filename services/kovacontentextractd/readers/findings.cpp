@@ -25,7 +25,7 @@ void AppendClean(std::string& out, std::string_view text) {
     out.append(kReplacement);
     text.remove_prefix(1);
   }
-  std::replace(out.begin() + static_cast<ptrdiff_t>(begin), out.end(), '\0', ' ');
+  for (size_t zero = begin; (zero = out.find('\0', zero)) != std::string::npos;) out[zero] = ' ';
 }
 
 /// A field's value: clean, without blanks at either end, not too long.

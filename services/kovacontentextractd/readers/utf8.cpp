@@ -1,55 +1,68 @@
 #include "services/kovacontentextractd/readers/utf8.h"
 
 #include <algorithm>
+#include <bit>
+#include <cstdint>
 #include <cstring>
 
 namespace ferrox::extract {
 
 namespace {
 
-/// The length of the valid character at `p`, 0 when there is none. Overlong forms, surrogates and what lies beyond
-/// U+10FFFF are not valid.
+constexpr uint64_t kHighBits = UINT64_C(0x8080808080808080);
+
+/// The high bits of the 8 bytes at `bytes`: those beyond ASCII have one.
+uint64_t HighBits(const unsigned char* bytes) {
+  uint64_t eight;
+  memcpy(&eight, bytes, sizeof(eight));
+  return eight & kHighBits;
+}
+
+/// How many bytes at the beginning are ASCII. Most text is, for long stretches.
+size_t AsciiPrefix(const unsigned char* bytes, size_t size) {
+  size_t at = 0;
+  for (uint64_t high = 0; size - at >= sizeof(high); at += sizeof(high)) {
+    high = HighBits(bytes + at);
+    if (high != 0) {
+      const int bits = std::endian::native == std::endian::little ? std::countr_zero(high) : std::countl_zero(high);
+      return at + static_cast<size_t>(bits) / 8;
+    }
+    while (size - at >= 40 && (HighBits(bytes + at + 8) | HighBits(bytes + at + 16) | HighBits(bytes + at + 24) |
+                               HighBits(bytes + at + 32)) == 0) {
+      at += 32;
+    }
+  }
+  while (at < size && bytes[at] < 0x80) ++at;
+  return at;
+}
+
+bool Continues(unsigned char byte) { return (byte & 0xC0) == 0x80; }
+
+/// The length of the valid character beyond ASCII at `p`, 0 when there is none. Overlong forms, surrogates and what
+/// lies beyond U+10FFFF are not valid.
 size_t CharacterLength(const unsigned char* p, size_t left) {
   const unsigned char lead = *p;
-  if (lead < 0x80) return 1;
-  size_t length;
-  unsigned char low = 0x80, high = 0xBF;  // what the second byte may be
-  if (lead >= 0xC2 && lead <= 0xDF) {
-    length = 2;
-  } else if (lead >= 0xE0 && lead <= 0xEF) {
-    length = 3;
-    if (lead == 0xE0) low = 0xA0;
-    if (lead == 0xED) high = 0x9F;
-  } else if (lead >= 0xF0 && lead <= 0xF4) {
-    length = 4;
-    if (lead == 0xF0) low = 0x90;
-    if (lead == 0xF4) high = 0x8F;
-  } else {
-    return 0;
-  }
-  if (left < length || p[1] < low || p[1] > high) return 0;
-  for (size_t i = 2; i < length; ++i) {
-    if ((p[i] & 0xC0) != 0x80) return 0;
-  }
-  return length;
+  if (lead < 0xC2 || left < 2 || !Continues(p[1])) return 0;
+  if (lead < 0xE0) return 2;
+  if (left < 3 || !Continues(p[2])) return 0;
+  const unsigned first_bits = (static_cast<unsigned>(lead) << 8) | p[1];
+  if (lead < 0xF0) return first_bits >= 0xE0A0 && (first_bits < 0xEDA0 || lead > 0xED) ? 3 : 0;
+  const bool whole = left >= 4 && Continues(p[3]);
+  return whole && first_bits >= 0xF090 && first_bits < 0xF490 ? 4 : 0;
 }
 
 }  // namespace
 
 size_t ValidUtf8Prefix(std::string_view text) {
   const auto* bytes = reinterpret_cast<const unsigned char*>(text.data());
-  size_t at = 0;
+  size_t at = AsciiPrefix(bytes, text.size());
   while (at < text.size()) {
-    uint64_t eight;
-    while (text.size() - at >= sizeof(eight)) {  // most text is ASCII for long stretches
-      memcpy(&eight, bytes + at, sizeof(eight));
-      if ((eight & UINT64_C(0x8080808080808080)) != 0) break;
-      at += sizeof(eight);
-    }
-    if (at == text.size()) break;
-    const size_t length = CharacterLength(bytes + at, text.size() - at);
-    if (length == 0) break;
-    at += length;
+    do {  // where one is beyond ASCII, others follow
+      const size_t length = CharacterLength(bytes + at, text.size() - at);
+      if (length == 0) return at;
+      at += length;
+    } while (at < text.size() && bytes[at] >= 0x80);
+    at += AsciiPrefix(bytes + at, text.size() - at);
   }
   return at;
 }
