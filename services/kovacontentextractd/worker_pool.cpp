@@ -46,7 +46,8 @@ bool Believe(const RawAnswer& raw, int region, const TextSink& text, Answer& ans
 /// A worker while it is busy; not given back, it ends.
 class WorkerPool::Lease {
  public:
-  Lease(WorkerPool& pool, Program program) : pool_(pool), program_(program), worker_(pool.Take(program)) {}
+  Lease(WorkerPool& pool, Program program, bool fresh = false)
+      : pool_(pool), program_(program), worker_(pool.Take(program, fresh)) {}
   Lease(const Lease&) = delete;
   Lease& operator=(const Lease&) = delete;
   ~Lease() { pool_.Give(std::move(worker_), program_); }
@@ -80,12 +81,18 @@ bool WorkerPool::Has(Program program) const {
 Answer WorkerPool::Read(Program program, const Task& task, const TextSink& text) {
   Answer answer;
   Outcome outcome = Outcome::kNotAsked;
+  bool fresh = false;
   for (int attempt = 0; attempt < kAttempts && outcome == Outcome::kNotAsked; ++attempt) {
-    Lease lease(*this, program);
+    Lease lease(*this, program, fresh);
     RawAnswer raw;
     outcome = lease.Worker().Ask(task, options_.longest_read, raw);
     if (outcome == Outcome::kAnswered && !Believe(raw, lease.Worker().Region(), text, answer)) {
       outcome = Outcome::kNonsense;
+    }
+    // What an earlier file has done to the memory of its worker may end it now: one that has read no other decides.
+    if (outcome == Outcome::kCrashed && lease.Worker().FilesRead() > 1) {
+      outcome = Outcome::kNotAsked;
+      fresh = true;
     }
     if (outcome != Outcome::kAnswered) lease.End();
   }
@@ -113,14 +120,14 @@ std::unique_ptr<WorkerProcess> WorkerPool::TakeIdle(Program program) {
   return worker;
 }
 
-std::unique_ptr<WorkerProcess> WorkerPool::Take(Program program) {
+std::unique_ptr<WorkerProcess> WorkerPool::Take(Program program, bool fresh) {
   std::unique_ptr<WorkerProcess> given_up;
   {
     std::unique_lock lock(mutex_);
     given_.wait(lock, [this] { return busy_ < options_.workers_max; });
     ++busy_;
     if (std::exchange(nothing_to_end_, false)) something_to_end_.notify_one();
-    while (std::unique_ptr<WorkerProcess> worker = TakeIdle(program)) {
+    while (std::unique_ptr<WorkerProcess> worker = fresh ? nullptr : TakeIdle(program)) {
       if (worker->IsReady()) return worker;
     }
     if (busy_ + idle_.size() > options_.workers_max) {  // those of other programs make room
@@ -128,6 +135,7 @@ std::unique_ptr<WorkerProcess> WorkerPool::Take(Program program) {
       idle_.erase(idle_.begin());
     }
   }
+  given_up.reset();  // first, so that there are never more than there may be
   try {
     return Start(program);
   } catch (...) {
@@ -172,7 +180,7 @@ std::unique_ptr<WorkerProcess> WorkerPool::Start(Program program) {
 }
 
 void WorkerPool::Give(std::unique_ptr<WorkerProcess> worker, Program program) {
-  const bool kept = worker != nullptr && worker->FilesRead() < options_.files_per_worker;
+  const bool kept = worker != nullptr && worker->FilesRead() < options_.files_per_worker && worker->IsReady();
   if (!kept) worker.reset();
   {
     const std::lock_guard guard(mutex_);

@@ -71,7 +71,7 @@ class WorkerPool {
 
   class Lease;
   std::unique_ptr<WorkerProcess> TakeIdle(kova::content::Program program);
-  std::unique_ptr<WorkerProcess> Take(kova::content::Program program);
+  std::unique_ptr<WorkerProcess> Take(kova::content::Program program, bool fresh);
   void Give(std::unique_ptr<WorkerProcess> worker, kova::content::Program program);
   std::unique_ptr<WorkerProcess> Start(kova::content::Program program);
   std::unique_ptr<WorkerProcess> Fork(kova::content::Program program);

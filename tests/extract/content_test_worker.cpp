@@ -93,6 +93,41 @@ void AnswerTwice(const Source&, Findings& findings) {
   findings.Set("KOVAMDTitle", "late");
 }
 
+void AnswerByHalves(const Source&, Findings&) {
+  (void)!write(kWorkerSocket, "\x10\0\0", 3);
+  (void)close(kWorkerSocket);
+  for (;;) (void)sched_yield();
+}
+
+/// Slower than anybody waits, but never silent.
+void AnswerInDrips(const Source&, Findings&) {
+  Announce(kAnswerMaxBytes);
+  for (;;) {
+    (void)!write(kWorkerSocket, "{", 1);
+    for (int i = 0; i < 1000; ++i) (void)sched_yield();
+  }
+}
+
+void AnswerAnother(const Source&, Findings& findings) {
+  g_number += 6;
+  Announce(0);
+  findings.AddText("late");
+}
+
+/// What an idle worker says, nobody hears.
+void GoOnTalking(const Source&, Findings&) {
+  Announce(2);
+  (void)!write(kWorkerSocket, "{}", 2);
+  for (const std::string noise(4096, '\0'); write(kWorkerSocket, noise.data(), noise.size()) > 0;) {
+  }
+}
+
+void AnswerAndLeave(const Source&, Findings&) {
+  Announce(2);
+  (void)!write(kWorkerSocket, "{}", 2);
+  _exit(0);
+}
+
 bool Executes(void* page) { return page != MAP_FAILED; }
 
 /// Lists what of the forbidden works.
@@ -144,6 +179,11 @@ int main(int argc, char** argv) {
       {"long text", &Counted<AnnounceLongText>},
       {"twice", &Counted<AnswerTwice>},
       {"escape", &Counted<TryToEscape>},
+      {"halves", &Counted<AnswerByHalves>},
+      {"drips", &Counted<AnswerInDrips>},
+      {"another", &Counted<AnswerAnother>},
+      {"talk", &Counted<GoOnTalking>},
+      {"leave", &Counted<AnswerAndLeave>},
   };
   const Worker worker = {kReaders, std::size(kReaders), [] {}};
   return RunWorker(worker, argc > 1 ? argv[1] : nullptr);

@@ -74,7 +74,7 @@ TEST_F(WorkerPoolTest, EachBadFileIsBlamedOnceAndTheNextIsRead) {
   WorkerPool pool(TestOptions());
   const struct {
     const char* reader;
-    const char* content;
+    std::string content;
     const char* reason;
   } rows[] = {
       {"crash", "", "crashed the reader"},
@@ -87,6 +87,9 @@ TEST_F(WorkerPoolTest, EachBadFileIsBlamedOnceAndTheNextIsRead) {
       {"bytes", "[1]", "confused the reader"},
       {"bytes", "{\"KOVAMDTitle\":\"x", "confused the reader"},
       {"long text", "", "confused the reader"},
+      {"bytes", std::string(100000, '['), "confused the reader"},
+      {"halves", "", "crashed the reader"},
+      {"another", "", "confused the reader"},
   };
   uint64_t read = 0;
   for (const auto& row : rows) {
@@ -104,8 +107,19 @@ TEST_F(WorkerPoolTest, ASilentWorkerIsEnded) {
   WorkerPool::Options options = TestOptions();
   options.longest_read = 200ms;
   WorkerPool pool(options);
-  EXPECT_EQ("took too long", Read(pool, "hang").fields["_KOVAExtractError"].asString());
-  EXPECT_EQ(0U, pool.Status()["workers"].asUInt());
+  for (const char* reader : {"hang", "drips"}) {
+    EXPECT_EQ("took too long", Read(pool, reader).fields["_KOVAExtractError"].asString()) << reader;
+    EXPECT_EQ(0U, pool.Status()["workers"].asUInt());
+  }
+}
+
+TEST_F(WorkerPoolTest, WhatAWorkerDoesBehindItsAnswerIsNotTheNextFilesFault) {
+  WorkerPool pool(TestOptions());
+  for (const char* reader : {"talk", "leave", "talk", "leave"}) {
+    EXPECT_FALSE(Read(pool, reader).fields.isMember("_KOVAExtractError")) << reader;
+    EXPECT_EQ("1", Read(pool, "count").text) << "of a new worker, behind " << reader;
+  }
+  EXPECT_EQ(0U, pool.Status()["blamed"].asUInt());
 }
 
 TEST_F(WorkerPoolTest, AnAnswerIsNeverTakenForAnotherFiles) {
