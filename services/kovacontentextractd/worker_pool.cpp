@@ -180,7 +180,7 @@ std::unique_ptr<WorkerProcess> WorkerPool::Start(Program program) {
 }
 
 void WorkerPool::Give(std::unique_ptr<WorkerProcess> worker, Program program) {
-  const bool kept = worker != nullptr && worker->FilesRead() < options_.files_per_worker && worker->IsReady();
+  const bool kept = worker != nullptr && worker->FilesRead() < options_.files_per_worker;
   if (!kept) worker.reset();
   {
     const std::lock_guard guard(mutex_);

@@ -6,6 +6,7 @@
 #include <sys/wait.h>
 
 #include <algorithm>
+#include <array>
 #include <cerrno>
 #include <cstring>
 #include <optional>
@@ -78,29 +79,39 @@ bool WorkerProcess::Send(const Task& task) {
 
 WorkerProcess::Outcome WorkerProcess::Receive(TimePoint end, RawAnswer& answer) {
   AnswerHeader header;
-  const Outcome outcome = ReadExactly(&header, sizeof(header), end);
-  if (outcome != Outcome::kAnswered) return outcome;
+  std::array<char, 4096> buffer;  // most answers are shorter
+  size_t have = 0;
+  while (have < sizeof(header)) {
+    const Outcome outcome = ReceiveSome(buffer.data(), buffer.size(), end, have);
+    if (outcome != Outcome::kAnswered) return outcome;
+  }
+  memcpy(&header, buffer.data(), sizeof(header));
   // An earlier file may still speak, but not where there was none: nobody waits for ever for one that lies about it.
   if (header.number != requests_) return requests_ <= 1 ? Outcome::kNonsense : Outcome::kNotAsked;
   if (header.json_bytes > kAnswerMaxBytes) return Outcome::kNonsense;
-  answer.json.resize(header.json_bytes);
   answer.text_bytes = header.text_bytes;
-  return ReadExactly(answer.json.data(), answer.json.size(), end);
+  answer.json.assign(buffer.data() + sizeof(header), std::min<size_t>(have - sizeof(header), header.json_bytes));
+  have = answer.json.size();
+  answer.json.resize(header.json_bytes);
+  while (have < answer.json.size()) {
+    const Outcome outcome = ReceiveSome(answer.json.data(), answer.json.size(), end, have);
+    if (outcome != Outcome::kAnswered) return outcome;
+  }
+  return Outcome::kAnswered;
 }
 
-WorkerProcess::Outcome WorkerProcess::ReadExactly(void* to, size_t bytes, TimePoint end) {
-  auto* next = static_cast<char*>(to);
-  while (bytes > 0) {
+/// Waits for bytes and puts them behind the `have` that `to` has already, which rises.
+WorkerProcess::Outcome WorkerProcess::ReceiveSome(char* to, size_t room, TimePoint end, size_t& have) {
+  for (;;) {
     pollfd state = {socket_.Get(), POLLIN, 0};
     const int ready = poll(&state, 1, MillisecondsUntil(end));
     if (ready == 0) return Outcome::kTookTooLong;
-    const ssize_t got = ready < 0 ? -1 : recv(socket_.Get(), next, bytes, MSG_DONTWAIT);
+    const ssize_t got = ready < 0 ? -1 : recv(socket_.Get(), to + have, room - have, MSG_DONTWAIT);
     if (got < 0 && (errno == EINTR || errno == EAGAIN)) continue;
     if (got <= 0) return Outcome::kCrashed;
-    next += got;
-    bytes -= static_cast<size_t>(got);
+    have += static_cast<size_t>(got);
+    return Outcome::kAnswered;
   }
-  return Outcome::kAnswered;
 }
 
 /// What the end of a process says about the file that it was reading.

@@ -57,7 +57,7 @@ class WorkerProcess {
 
   bool Send(const Task& task);
   Outcome Receive(TimePoint end, RawAnswer& answer);
-  Outcome ReadExactly(void* to, size_t bytes, TimePoint end);
+  Outcome ReceiveSome(char* to, size_t room, TimePoint end, size_t& have);
   Outcome HowItEnded();
 
   UniqueFd socket_;

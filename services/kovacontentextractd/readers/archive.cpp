@@ -32,12 +32,25 @@ struct Input {
   FileBytes file;
   uint64_t at = 0;
   std::vector<char> piece;
+  int64_t unpacked = -1;  ///< so far, and what was read since without any more
+  uint64_t read_in_vain = 0;
 };
 
-la_ssize_t OnRead(archive*, void* data, const void** buffer) {
+/// Padding behind packed data may be as long as it likes.
+bool LeadsNowhere(archive* reader, Input& input) {
+  constexpr uint64_t kReadInVainMaxBytes = 16U << 20;
+  const int64_t unpacked = archive_filter_bytes(reader, 0);
+  if (unpacked != input.unpacked) input.read_in_vain = 0;
+  input.unpacked = unpacked;
+  return input.read_in_vain > kReadInVainMaxBytes;
+}
+
+la_ssize_t OnRead(archive* reader, void* data, const void** buffer) {
   auto& input = *static_cast<Input*>(data);
+  if (LeadsNowhere(reader, input)) return 0;
   const size_t got = input.file.ReadAt(input.at, input.piece.data(), input.piece.size());
   input.at += got;
+  input.read_in_vain += got;
   *buffer = input.piece.data();
   return static_cast<la_ssize_t>(got);
 }

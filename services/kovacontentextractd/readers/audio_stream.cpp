@@ -9,17 +9,21 @@ namespace {
 
 constexpr long kBlockMaxBytes = 16L << 20;
 constexpr long kReadMaxBytes = 256L << 20;
+constexpr std::chrono::milliseconds kCpuMax(1500);
+/// No sound is longer; what is holds sound to the library's mind, which searches it step by step.
+constexpr uint64_t kLengthMaxBytes = 4ULL << 30;
 
 }  // namespace
 
 AudioStream::AudioStream(const Source& source, uint64_t begin, uint64_t end, std::string name)
-    : file_(source), begin_(std::min(begin, file_.Size())), name_(std::move(name)) {
-  const uint64_t length = std::clamp(end, begin_, file_.Size()) - begin_;
+    : file_(source), begin_(std::min(begin, file_.Size())), budget_(kCpuMax), name_(std::move(name)) {
+  const uint64_t length = std::min(std::clamp(end, begin_, file_.Size()) - begin_, kLengthMaxBytes);
   length_ = static_cast<long>(std::min<uint64_t>(length, std::numeric_limits<long>::max()));
 }
 
 TagLib::ByteVector AudioStream::readBlock(unsigned long length) {
-  const long left = read_ < kReadMaxBytes ? std::clamp(length_ - at_, 0L, kBlockMaxBytes) : 0;
+  ended_ = ended_ || read_ >= kReadMaxBytes || budget_.IsSpent();
+  const long left = !ended_ ? std::clamp(length_ - at_, 0L, kBlockMaxBytes) : 0;
   const auto wanted = static_cast<unsigned>(std::min<unsigned long>(length, static_cast<unsigned long>(left)));
   TagLib::ByteVector block(wanted, '\0');
   const size_t got = wanted > 0 ? file_.ReadAt(begin_ + static_cast<uint64_t>(at_), block.data(), wanted) : 0;

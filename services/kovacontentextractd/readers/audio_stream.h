@@ -4,11 +4,12 @@
 #include <taglib/tiostream.h>
 
 #include "services/kovacontentextractd/readers/byte_source.h"
+#include "services/kovacontentextractd/readers/cpu_budget.h"
 
 namespace ferrox::extract {
 
 /// A part of a file as the tag library wants it: read only, never more at a time than a tag may have, and ended where
-/// more was read than tags can have: the library searches a whole damaged file for sound.
+/// more was read, or more time spent, than tags can take: the library searches a whole damaged file for sound.
 class AudioStream : public TagLib::IOStream {
  public:
   AudioStream(const Source& source, uint64_t begin, uint64_t end, std::string name);
@@ -32,6 +33,8 @@ class AudioStream : public TagLib::IOStream {
   long length_;  ///< the library counts in long, so that on 32 bits a file ends at 2 GiB
   long at_ = 0;
   long read_ = 0;  ///< in all
+  CpuBudget budget_;
+  bool ended_ = false;  ///< nothing more is given
   std::string name_;
 };
 

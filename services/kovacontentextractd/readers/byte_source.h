@@ -1,5 +1,6 @@
 #pragma once
 
+#include <algorithm>
 #include <cstddef>
 #include <cstdint>
 #include <string>
@@ -39,6 +40,8 @@ class FileSource : public ByteSource {
  public:
   explicit FileSource(const Source& source) : bytes_(source) {}
   size_t Read(char* buffer, size_t room) override;
+  /// Passes `count` bytes without reading them.
+  void Skip(uint64_t count) { at_ += std::min(count, bytes_.Size() - std::min(at_, bytes_.Size())); }
 
  private:
   FileBytes bytes_;

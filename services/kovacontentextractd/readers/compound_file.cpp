@@ -16,6 +16,8 @@ constexpr size_t kEntryBytes = 128;
 constexpr uint8_t kStorageType = 1, kStreamType = 2;
 constexpr size_t kEntriesMax = 65536;
 constexpr uint64_t kTableMax = 8U << 20;  ///< sectors: a file of 4 GiB
+constexpr uint64_t kStreamMaxBytes = 128U << 20;
+constexpr size_t kPieceBytes = 4096;
 
 }  // namespace
 
@@ -44,7 +46,16 @@ std::string CompoundStream::ReadAt(uint64_t offset, size_t size) const {
 }
 
 size_t CompoundStream::Read(char* buffer, size_t room) {
-  const size_t got = ReadAt(at_, buffer, room);
+  size_t got = 0;
+  if (room >= kPieceBytes) {
+    got = ReadAt(at_, buffer, room);
+  } else {
+    if (at_ < piece_at_ || at_ + room > piece_at_ + piece_.size()) {
+      piece_ = ReadAt(at_, kPieceBytes);
+      piece_at_ = at_;
+    }
+    got = std::string_view(piece_).substr(static_cast<size_t>(at_ - piece_at_)).copy(buffer, room);
+  }
   at_ += got;
   return got;
 }
@@ -86,7 +97,9 @@ void CompoundFile::ReadSectorTable(const std::string& header) {
   };
   append(std::string_view(header).substr(0x4C));
   uint32_t next = Little32(header, 0x44);
-  for (uint64_t lists = 0; next < kLastSector && lists < sectors_max_ && table_.size() < sectors_max_; ++lists) {
+  const uint64_t per_sector = (uint64_t{1} << sector_shift_) / 4;
+  const uint64_t lists_max = sectors_max_ / (per_sector * (per_sector - 1)) + 1;
+  for (uint64_t lists = 0; next < kLastSector && lists < lists_max && table_.size() < sectors_max_; ++lists) {
     const std::string list = ReadSector(next);
     if (list.size() < 8) return;
     append(std::string_view(list).substr(0, list.size() - 4));
@@ -94,26 +107,28 @@ void CompoundFile::ReadSectorTable(const std::string& header) {
   }
 }
 
-std::vector<uint32_t> CompoundFile::Chain(const std::vector<uint32_t>& table, uint32_t first) const {
+std::vector<uint32_t> CompoundFile::Chain(const std::vector<uint32_t>& table, uint32_t first, uint64_t bytes,
+                                          uint32_t shift) {
+  const uint64_t count = std::min<uint64_t>(table.size(), (bytes + (uint64_t{1} << shift) - 1) >> shift);
   std::vector<uint32_t> sectors;
-  for (uint32_t sector = first; sector < table.size() && sectors.size() < table.size(); sector = table[sector]) {
+  for (uint32_t sector = first; sector < table.size() && sectors.size() < count; sector = table[sector]) {
     sectors.push_back(sector);
   }
   return sectors;
 }
 
 void CompoundFile::ReadMiniTable(uint32_t first) {
-  const uint64_t room = sectors_max_ << (sector_shift_ - mini_shift_);
-  for (const uint32_t sector : Chain(table_, first)) {
+  const uint64_t room = std::min(sectors_max_ << (sector_shift_ - mini_shift_), kTableMax);
+  for (const uint32_t sector : Chain(table_, first, room * 4, sector_shift_)) {
     const std::string bytes = ReadSector(sector);
-    for (size_t at = 0; at + 4 <= bytes.size() && mini_table_.size() < std::min(room, kTableMax); at += 4) {
+    for (size_t at = 0; at + 4 <= bytes.size() && mini_table_.size() < room; at += 4) {
       mini_table_.push_back(Little32(bytes, at));
     }
   }
 }
 
 void CompoundFile::ReadEntries(uint32_t first) {
-  for (const uint32_t sector : Chain(table_, first)) {
+  for (const uint32_t sector : Chain(table_, first, kEntriesMax * kEntryBytes, sector_shift_)) {
     const std::string bytes = ReadSector(sector);
     for (size_t at = 0; at + kEntryBytes <= bytes.size() && entries_.size() < kEntriesMax; at += kEntryBytes) {
       const std::string_view entry = std::string_view(bytes).substr(at, kEntryBytes);
@@ -130,7 +145,7 @@ void CompoundFile::ReadEntries(uint32_t first) {
   }
   if (entries_.empty()) return;
   const Entry& root = entries_.front();
-  mini_stream_.sectors_ = Chain(table_, root.first_sector);
+  mini_stream_.sectors_ = Chain(table_, root.first_sector, root.size, sector_shift_);
   mini_stream_.size_ = std::min<uint64_t>(root.size, uint64_t{mini_stream_.sectors_.size()} << sector_shift_);
   FindParents();
 }
@@ -170,9 +185,10 @@ std::unique_ptr<CompoundStream> CompoundFile::Open(std::string_view name, uint32
   auto stream = std::make_unique<CompoundStream>();
   stream->file_ = this;
   stream->mini_ = found->size < mini_cutoff_;
-  stream->sectors_ = Chain(stream->mini_ ? mini_table_ : table_, found->first_sector);
   const uint32_t shift = stream->mini_ ? mini_shift_ : sector_shift_;
-  stream->size_ = std::min(found->size, uint64_t{stream->sectors_.size()} << shift);
+  const uint64_t size = std::min(found->size, kStreamMaxBytes);
+  stream->sectors_ = Chain(stream->mini_ ? mini_table_ : table_, found->first_sector, size, shift);
+  stream->size_ = std::min(size, uint64_t{stream->sectors_.size()} << shift);
   return stream;
 }
 

@@ -30,10 +30,12 @@ class CompoundStream : public ByteSource {
   bool mini_ = false;  ///< its sectors are small ones within the file's stream for them
   uint64_t size_ = 0;
   uint64_t at_ = 0;
+  std::string piece_;  ///< what is read in small steps, read ahead
+  uint64_t piece_at_ = 0;
 };
 
 /// The container of office files before they were ZIP files: a small file system. A chain of sectors that comes back on
-/// itself ends where more sectors would come than the file has.
+/// itself ends where more sectors would come than what it holds can have.
 class CompoundFile {
  public:
   explicit CompoundFile(const Source& source);
@@ -60,7 +62,9 @@ class CompoundFile {
   static constexpr uint32_t kNoParent = UINT32_MAX;
 
   uint64_t SectorOffset(uint32_t sector) const { return (uint64_t{sector} + 1) << sector_shift_; }
-  std::vector<uint32_t> Chain(const std::vector<uint32_t>& table, uint32_t first) const;
+  /// At most `bytes`, in sectors of 2^shift.
+  static std::vector<uint32_t> Chain(const std::vector<uint32_t>& table, uint32_t first, uint64_t bytes,
+                                     uint32_t shift);
   void ReadSectorTable(const std::string& header);
   void ReadMiniTable(uint32_t first);
   void ReadEntries(uint32_t first);

@@ -1,5 +1,7 @@
 #include <algorithm>
 #include <cmath>
+#include <cstring>
+#include <string>
 
 #include "services/kovacontentextractd/readers/reader.h"
 #include "services/kovacontentextractd/readers/utf8.h"
@@ -10,6 +12,8 @@ namespace {
 
 /// Of one field: titles and comments are shorter, and a file must not fill the answer with something else than text.
 constexpr size_t kFieldMaxBytes = 32U << 10;
+/// Values of lists, of all fields together: each is compared with those before it.
+constexpr int kAppendMax = 50000;
 constexpr std::string_view kBetweenValues = ", ";
 constexpr std::string_view kReplacement = "\xEF\xBF\xBD";
 constexpr std::string_view kBlanks("\0 \t\r\n\v\f", 7);
@@ -39,16 +43,19 @@ std::string FieldValue(std::string_view text) {
   return value;
 }
 
-/// Whether `value` is one of the values that `joined` holds.
+std::string_view View(const Json::Value& value) {
+  const char *begin = nullptr, *end = nullptr;
+  if (!value.isString() || !value.getString(&begin, &end)) return {};
+  return {begin, static_cast<size_t>(end - begin)};
+}
+
+/// Whether `value` is one of the values that `joined` holds. What separates them is looked for with it: a value that
+/// is one character, in one that is only that character, would be found too often otherwise.
 bool Holds(std::string_view joined, std::string_view value) {
-  for (size_t at = joined.find(value); at != std::string_view::npos; at = joined.find(value, at + 1)) {
-    const std::string_view before = joined.substr(0, at), behind = joined.substr(at + value.size());
-    if ((before.empty() || before.ends_with(kBetweenValues)) &&
-        (behind.empty() || behind.starts_with(kBetweenValues))) {
-      return true;
-    }
-  }
-  return false;
+  const std::string separator(kBetweenValues);
+  const std::string begin = std::string(value) + separator, end = separator + std::string(value);
+  return joined == value || joined.starts_with(begin) || joined.ends_with(end) ||
+         joined.find(end + separator) != std::string_view::npos;
 }
 
 }  // namespace
@@ -76,13 +83,15 @@ void Findings::Set(const char* field, std::string_view value) {
 }
 
 void Findings::Append(const char* field, std::string_view value) {
-  const Json::Value& present = fields_[field];
-  const std::string joined = present.isString() ? present.asString() : std::string();
-  const std::string added = FieldValue(value);
-  if (joined.empty()) return added.empty() ? (void)fields_.removeMember(field) : Set(field, added);
+  const Json::Value* present = fields_.find(field, field + strlen(field));
+  const std::string_view joined = present != nullptr ? View(*present) : std::string_view();
+  const bool full = joined.size() + kBetweenValues.size() >= kFieldMaxBytes || appended_ == kAppendMax;
+  const std::string added = full ? std::string() : FieldValue(value);
+  if (added.empty()) return;
+  ++appended_;
+  if (joined.empty()) return Set(field, added);
   const bool fits = joined.size() + kBetweenValues.size() + added.size() <= kFieldMaxBytes;
-  if (added.empty() || !fits || Holds(joined, added)) return;
-  fields_[field] = joined + std::string(kBetweenValues) + added;
+  if (fits && !Holds(joined, added)) fields_[field] = std::string(joined) + std::string(kBetweenValues) + added;
 }
 
 void Findings::SetInteger(const char* field, int64_t value) { fields_[field] = Json::Int64(value); }

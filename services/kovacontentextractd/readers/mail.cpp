@@ -9,8 +9,10 @@
 #include <utility>
 
 #include "services/kovacontentextractd/readers/byte_source.h"
+#include "services/kovacontentextractd/readers/cpu_budget.h"
 #include "services/kovacontentextractd/readers/encoding.h"
 #include "services/kovacontentextractd/readers/latin1.h"
+#include "services/kovacontentextractd/readers/mail_extent.h"
 #include "services/kovacontentextractd/readers/markup.h"
 
 namespace ferrox::extract {
@@ -18,6 +20,7 @@ namespace ferrox::extract {
 namespace {
 
 constexpr int kMessagesMax = 20000;
+constexpr std::chrono::milliseconds kCpuMax(4000);
 constexpr int kPartsMax = 1000;
 constexpr int kLevelsMax = 16;
 constexpr int kAddressesMax = 500;
@@ -50,12 +53,20 @@ class MailReader {
   MailReader(const Source& source, Findings& findings)
       : findings_(findings), is_box_(FileBytes(source).ReadAt(0, 5) == "From "), depth_(source.depth) {}
 
-  void Read(int fd) {
-    const Ref<GMimeStream> stream(g_mime_stream_fs_new(fd));
+  void Read(const Source& source, int fd) {
+    const uint64_t extent = MailExtent(source, is_box_);
+    ReadMessages(fd, extent);
+    if (extent < source.size) findings_.MarkCut();
+  }
+
+ private:
+  void ReadMessages(int fd, uint64_t extent) {
+    const Ref<GMimeStream> stream(g_mime_stream_fs_new_with_bounds(fd, 0, static_cast<gint64>(extent)));
     const Ref<GMimeParser> parser(g_mime_parser_new_with_stream(stream.get()));
     g_mime_parser_set_format(parser.get(), is_box_ ? GMIME_FORMAT_MBOX : GMIME_FORMAT_MESSAGE);
     const Options options = HeaderOptions();
-    for (int count = 0; count < kMessagesMax; ++count) {
+    const CpuBudget budget(kCpuMax);
+    for (int count = 0; count < kMessagesMax && !budget.IsSpent(); ++count) {
       const Ref<GMimeMessage> message(g_mime_parser_construct_message(parser.get(), options.get()));
       if (message == nullptr) {
         if (count == 0) findings_.Fail("damaged");
@@ -67,7 +78,6 @@ class MailReader {
     }
   }
 
- private:
   void AddHeader(GMimeMessage* message) {
     encoding_ = TrueEncoding(View(g_mime_message_get_subject(message)));
     AddPeople(message, GMIME_ADDRESS_TYPE_FROM, "KOVAMDAuthors", "KOVAMDAuthorAddresses");
@@ -246,7 +256,7 @@ void ReadMail(const Source& source, Findings& findings) {
     if (fd >= 0) (void)close(fd);
     return findings.Fail("damaged");
   }
-  MailReader(source, findings).Read(fd);
+  MailReader(source, findings).Read(source, fd);
 }
 
 }  // namespace ferrox::extract

@@ -83,11 +83,10 @@ std::vector<Relation> ReadRelations(ZipContainer& zip, std::string_view part) {
   return relations;
 }
 
-std::string TargetById(const std::vector<Relation>& relations, std::string_view id) {
-  for (const Relation& relation : relations) {
-    if (relation.id == id) return relation.target;
-  }
-  return {};
+std::map<std::string, std::string> TargetsById(const std::vector<Relation>& relations) {
+  std::map<std::string, std::string> targets;
+  for (const Relation& relation : relations) targets.emplace(relation.id, relation.target);
+  return targets;
 }
 
 std::string TargetByType(const std::vector<Relation>& relations, std::string_view type) {

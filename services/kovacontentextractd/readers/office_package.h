@@ -1,6 +1,7 @@
 #pragma once
 
 #include <initializer_list>
+#include <map>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -19,8 +20,9 @@ struct Relation {
 
 /// The relations of a part to others in the container; those of the container itself for an empty name.
 std::vector<Relation> ReadRelations(ZipContainer& zip, std::string_view part);
-/// The member that a relation points to; empty when there is none of that id.
-std::string TargetById(const std::vector<Relation>& relations, std::string_view id);
+/// The members that relations point to, by the relations' ids.
+std::map<std::string, std::string> TargetsById(const std::vector<Relation>& relations);
+/// The member that the first relation of this type points to; empty when there is none.
 std::string TargetByType(const std::vector<Relation>& relations, std::string_view type);
 
 /// Adds the text of a part's paragraphs. False when the findings take no more.

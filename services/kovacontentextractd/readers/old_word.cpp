@@ -13,6 +13,8 @@ namespace {
 constexpr size_t kHeaderBytes = 1024;
 constexpr size_t kPieceBytes = 32U << 10;
 constexpr uint32_t kPieceTableMax = 8U << 20;
+/// Of all pieces: they may overlap, and hold nothing.
+constexpr uint64_t kCharactersMaxBytes = 64U << 20;
 constexpr uint16_t kWord97 = 0x00C1;
 
 /// Makes text of Word's characters: marks of paragraphs and cells, and fields, whose instructions are left out.
@@ -91,13 +93,17 @@ void AddPieces(const CompoundStream& document, const std::string& table, Finding
   const size_t count =
       table.size() < kPositionBytes ? 0 : (table.size() - kPositionBytes) / (kPositionBytes + kDescriptorBytes);
   WordText text(findings);
-  for (size_t i = 0; i < count; ++i) {
+  uint64_t read = 0;
+  for (size_t i = 0; i < count && read < kCharactersMaxBytes; ++i) {
     const uint32_t begin = Little32(table, i * kPositionBytes), end = Little32(table, (i + 1) * kPositionBytes);
     const uint32_t place = Little32(table, (count + 1) * kPositionBytes + i * kDescriptorBytes + 2);
     if (end <= begin) continue;
     const bool wide = (place & kNarrow) == 0;
     const uint64_t offset = wide ? place : (place & ~kNarrow) / 2;
-    if (!AddPiece(document, offset, uint64_t{end - begin} * (wide ? 2 : 1), wide, text)) return;
+    const uint64_t left = document.Size() - std::min(offset, document.Size());
+    const uint64_t size = std::min({uint64_t{end - begin} * (wide ? 2 : 1), left, kCharactersMaxBytes - read});
+    read += size;
+    if (!AddPiece(document, offset, size, wide, text)) return;
   }
 }
 

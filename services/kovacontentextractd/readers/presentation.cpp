@@ -30,8 +30,9 @@ void ReadPresentation(ZipContainer& zip, const std::string& part, Findings& find
   const std::vector<Relation> relations = ReadRelations(zip, part);
   const std::vector<std::string> ids = SlideIds(zip, part);
   if (!ids.empty()) findings.SetInteger("KOVAMDNumberOfPages", static_cast<int64_t>(ids.size()));
+  std::map<std::string, std::string> targets = TargetsById(relations);
   for (const std::string& id : ids) {
-    const std::string slide = TargetById(relations, id);
+    const std::string& slide = targets[id];
     if (slide.empty()) continue;
     if (!AddParagraphs(zip, slide, findings)) return;
     if (!AddRelated(zip, ReadRelations(zip, slide), {"notesSlide", "comments", "diagramData", "chart"}, findings))

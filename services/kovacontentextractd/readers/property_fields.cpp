@@ -14,6 +14,7 @@ namespace {
 using Token = XmlTokenizer::Token;
 
 constexpr size_t kValueMaxBytes = 32U << 10;
+constexpr int kPropertiesMax = 20000;
 
 void SetTime(const char* field, std::string_view value, Findings& findings) {
   if (const auto seconds = ParseTime(value)) findings.SetInteger(field, *seconds);
@@ -41,12 +42,15 @@ void SetProperty(const PropertyField& property, std::string_view value, Findings
 void AddPropertyFields(ByteSource& source, std::span<const PropertyField> fields, Findings& findings) {
   XmlTokenizer xml(source);
   std::string value;
-  for (Token token; xml.Next(token);) {
+  int found = 0;
+  for (Token token; found < kPropertiesMax && xml.Next(token);) {
     if (token == Token::kOpen) value.clear();
     if (token == Token::kText && value.size() < kValueMaxBytes) value += xml.Text();
     if (token != Token::kClose) continue;
     for (const PropertyField& property : fields) {
-      if (property.element == xml.Name()) SetProperty(property, value, findings);
+      if (property.element != xml.Name()) continue;
+      SetProperty(property, value, findings);
+      ++found;
     }
     value.clear();
   }

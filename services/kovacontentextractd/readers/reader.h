@@ -66,6 +66,7 @@ class Findings {
   Limits limits_;
   std::string text_;
   bool cut_ = false;
+  int appended_ = 0;  ///< values of lists
   std::string failure_;
   Json::Value fields_ = Json::Value(Json::objectValue);
 };

@@ -22,6 +22,8 @@ constexpr size_t kDepthMax = 2000;
 constexpr size_t kFontsMax = 10000;
 constexpr size_t kPieceBytes = 32U << 10;
 constexpr int kMacRoman = 10000;
+/// Pictures are most of a long file, written in letters.
+constexpr uint64_t kReadMaxBytes = 256U << 20;
 
 /// Where text goes in a group.
 enum class Target : uint8_t { kText, kNowhere, kFontTable, kField };
@@ -136,6 +138,7 @@ class RichTextReader {
     }
     FlushBytes();
     FlushText();
+    if (read_ > kReadMaxBytes) findings_.MarkCut();
   }
 
  private:
@@ -143,12 +146,14 @@ class RichTextReader {
 
   int Get() {
     if (at_ == size_) {
-      size_ = source_.Read(buffer_.data(), buffer_.size());
+      size_ = read_ <= kReadMaxBytes ? source_.Read(buffer_.data(), buffer_.size()) : 0;
+      read_ += size_;
       at_ = 0;
     }
     return at_ < size_ ? static_cast<unsigned char>(buffer_[at_++]) : -1;
   }
-  void Unget() { --at_; }
+  /// Of the byte that Get gave last, if it gave one.
+  void Unget() { at_ -= size_ > 0 ? 1 : 0; }
 
   void Open() {
     FlushBytes();
@@ -281,7 +286,10 @@ class RichTextReader {
   }
 
   void SkipBytes(int count) {
-    for (; count > 0 && Get() >= 0; --count) continue;
+    if (count <= 0) return;
+    const size_t here = std::min(static_cast<size_t>(count), size_ - at_);
+    at_ += here;
+    source_.Skip(static_cast<uint64_t>(count) - here);
   }
 
   void AddByte(char byte) {
@@ -343,6 +351,7 @@ class RichTextReader {
   Findings& findings_;
   std::array<char, 16384> buffer_;
   size_t at_ = 0, size_ = 0;
+  uint64_t read_ = 0;
   std::vector<Group> groups_;
   std::map<int, int> fonts_;  ///< their code pages
   int font_ = 0;              ///< the one in the table that is being read

@@ -9,6 +9,7 @@ namespace ferrox::extract {
 namespace {
 
 constexpr size_t kSetMaxBytes = 1U << 20;
+constexpr size_t kTextMaxBytes = 64U << 10;
 constexpr uint32_t kPropertiesMax = 1000;
 constexpr uint32_t kCodePageId = 1;
 enum ValueType : uint32_t { kInt16 = 2, kInt32 = 3, kBytes = 30, kUtf16 = 31, kFileTime = 64 };
@@ -41,7 +42,7 @@ constexpr Property kDocumentSummary[] = {
 void SetValue(std::string_view set, size_t at, int code_page, const char* field, Findings& findings) {
   const uint32_t type = Little32(set, at) & 0xFFFF;
   const std::string_view value = set.substr(std::min(at + 4, set.size()));
-  const std::string_view text = value.substr(std::min<size_t>(4, value.size()));
+  const std::string_view text = value.substr(std::min<size_t>(4, value.size()), kTextMaxBytes);
   if (type == kBytes) {
     const std::string_view bytes = text.substr(0, Little32(value, 0));
     findings.Append(field, FromCodePage(bytes.substr(0, bytes.find('\0')), code_page));

@@ -146,8 +146,9 @@ void ReadWorkbook(ZipContainer& zip, const std::string& part, Findings& findings
   ReadSheetList(zip, part, workbook, findings);
   ReadStyles(zip, TargetByType(relations, "styles"), workbook);
   if (!AddSharedTexts(zip, TargetByType(relations, "sharedStrings"), findings)) return;
+  std::map<std::string, std::string> targets = TargetsById(relations);
   for (const std::string& id : workbook.sheets) {
-    const std::string sheet = TargetById(relations, id);
+    const std::string& sheet = targets[id];
     SheetReader reader(workbook, findings);
     if (!ForEachToken(zip, sheet, [&](XmlTokenizer& xml, Token token) { return reader.Take(xml, token); })) return;
     findings.Break();

@@ -106,7 +106,8 @@ bool ZipContainer::Spend(uint64_t bytes) {
   const Limits& limits = findings_.Bounds();
   unpacked_bytes_ += bytes;
   const uint64_t allowed = std::max(limits.expansion_free, limits.expansion_ratio * packed_bytes_);
-  exhausted_ = unpacked_bytes_ > allowed;
+  constexpr uint64_t kUnpackedMaxBytes = 256U << 20;  // a file may name the same member again and again
+  exhausted_ = unpacked_bytes_ > std::min(allowed, kUnpackedMaxBytes);
   if (exhausted_) findings_.Fail("expands to too much");
   return !exhausted_;
 }

@@ -11,6 +11,7 @@
 #include <string>
 
 #include "services/kovacontentextractd/readers/code_pages.h"
+#include "services/kovacontentextractd/readers/cpu_budget.h"
 #include "services/kovacontentextractd/readers/encoding.h"
 #include "services/kovacontentextractd/readers/mapped_file.h"
 #include "services/kovacontentextractd/readers/pdf/xmp_packet.h"
@@ -73,7 +74,10 @@ void AddInformation(const poppler::document& document, Findings& findings) {
 }
 
 void AddPages(const poppler::document& document, Findings& findings) {
+  constexpr std::chrono::milliseconds kCpuMax(10000);
+  const CpuBudget budget(kCpuMax);
   for (int i = 0; i < document.pages(); ++i) {
+    if (budget.IsSpent()) return findings.MarkCut();
     const std::unique_ptr<poppler::page> page(document.create_page(i));
     if (page == nullptr) {
       findings.Fail("damaged");

@@ -8,6 +8,7 @@
 #include <string>
 
 #include "services/kovacontentextractd/readers/byte_source.h"
+#include "services/kovacontentextractd/readers/cpu_budget.h"
 #include "services/kovacontentextractd/readers/latin1.h"
 #include "services/kovacontentextractd/readers/times.h"
 #include "services/kovacontentextractd/readers/utf8.h"
@@ -22,6 +23,7 @@ using MediaInfoLib::stream_t;
 /// Of a film, what describes it is at its beginning and its end.
 constexpr uint64_t kReadMaxBytes = 64U << 20;
 constexpr int kJumpsMax = 1000;
+constexpr std::chrono::milliseconds kCpuMax(1500);
 constexpr size_t kPieceBytes = 64U << 10;
 
 enum class Kind { kText, kInteger, kMilliseconds, kTime, kYear };
@@ -111,9 +113,10 @@ void Feed(MediaInfo& info, const Source& source) {
   constexpr size_t kFinished = 8;
   const FileBytes file(source);
   std::string piece(kPieceBytes, '\0');
+  const CpuBudget budget(kCpuMax);
   uint64_t at = 0, done = 0;
   (void)info.Open_Buffer_Init(source.size, 0);
-  for (int jumps = 0; done < kReadMaxBytes && jumps < kJumpsMax;) {
+  for (int jumps = 0; done < kReadMaxBytes && jumps < kJumpsMax && !budget.IsSpent();) {
     const size_t got = file.ReadAt(at, piece.data(), piece.size());
     if (got == 0) break;
     at += got;
