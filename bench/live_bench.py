@@ -9,6 +9,7 @@ Workloads, each in an instance of its own, with text files of 50 words drawn at 
   return   --files files indexed; the notification daemon and the index daemon end; 1,000 changes (400 rewritten, 200 new,
            200 deleted, 150 renamed, 50 moved by renaming their folder); the clock runs from the start of the daemons until
            both have answered "sync".
+  slow     the same on an instance that indexes 200 PDFs beside, each of which takes a reader some seconds.
   bulk     a tree of --bulk files in folders of 16, three deep, copied into the share; a folder with --files files renamed,
            and removed: seconds that the operation itself took, and until both daemons have answered "sync" behind it.
 Behind each clock the index is compared with the disk, every path, size, time and text; a difference ends the program.
@@ -28,6 +29,8 @@ import struct
 import subprocess
 import sys
 import time
+
+from mixed import documents
 
 SOURCE = os.path.join(os.path.dirname(os.path.abspath(__file__)), "..")
 WAY = {"fan": "fanotify", "marks": "fanotify inode marks", "inotify": "inotify", "scan": "periodic scan", "": ""}
@@ -152,6 +155,24 @@ def bench_latency(instance, options, rng):
     check(instance)
 
 
+def bench_slow(instance, options, rng):
+    docs = instance.share("docs")
+    make_tree(docs, 2000, rng)
+    check(instance)
+    os.makedirs(f"{instance.root}/vol/slow")
+    page = documents.pdf("slow", "nobody", ["slow " * 10] * 300, drawing=500000)
+    for number in range(200):
+        with open(f"{instance.root}/vol/slow/{number}.pdf", "wb") as file:
+            file.write(page)
+    os.rename(f"{instance.root}/vol/slow", f"{docs}/slow")
+    time.sleep(2)
+    begin, engine = instance.share_status("docs"), Engine(instance)
+    show("beside slow documents", *samples(engine, docs, options.samples // 3, rng))
+    end = instance.share_status("docs")
+    read = end["written"] - begin["written"] - options.samples // 3
+    print(f"slow documents read meanwhile: {read}; it was {begin['state']} and is {end['state']}", flush=True)
+
+
 def timed(instance, name, operation):
     before, begin = lost(instance), time.monotonic()
     operation()
@@ -209,7 +230,7 @@ def bench_bulk(instance, options, rng):
 
 def main():
     parser = argparse.ArgumentParser(description=__doc__, formatter_class=argparse.RawDescriptionHelpFormatter)
-    parser.add_argument("workloads", nargs="*", help="latency, return, bulk; absent: all")
+    parser.add_argument("workloads", nargs="*", help="latency, slow, return, bulk; absent: all")
     parser.add_argument("--build", default=f"{SOURCE}/build/release")
     parser.add_argument("--way", default="", choices=sorted(WAY), help="of watching; absent: the daemon's choice")
     parser.add_argument("--samples", type=int, default=300)
@@ -221,7 +242,7 @@ def main():
     sys.path.insert(0, f"{SOURCE}/tests/integration")
     from live import LiveInstance  # pylint: disable=import-outside-toplevel
 
-    for name, bench in (("latency", bench_latency), ("return", bench_return), ("bulk", bench_bulk)):
+    for name, bench in (("latency", bench_latency), ("slow", bench_slow), ("return", bench_return), ("bulk", bench_bulk)):
         if options.workloads and name not in options.workloads:
             continue
         instance = LiveInstance()

@@ -24,6 +24,8 @@ constexpr auto kCommitInterval = std::chrono::seconds(5);
 /// A comparison that has seen so many files tells how many there are.
 constexpr uint64_t kFilesBeforeCount = 500;
 constexpr unsigned kRemovedAtOnce = 1000;
+/// So few changes are what somebody is waiting for, rather than a folder that is copied.
+constexpr uint64_t kUrgentOperations = 4;
 
 }  // namespace
 
@@ -52,24 +54,31 @@ OperationRunner::OperationRunner(const PassContext& context)
       tasks_(context.pool, context.interruption),
       gone_trees_(tasks_, writer_, true),
       gone_(tasks_, writer_, false),
-      tail_(context_.queue_path),
-      ahead_before_(context_.written_ahead) {}
+      ahead_before_(context_.written_ahead),
+      follower_({context_.share, context_.root, context_.folders, context_.queue_path, writer_, context_.pool,
+                 context_.interruption, context_.keep_up_interval}) {}
+
+/// What was written ahead is there, however the pass ends.
+OperationRunner::~OperationRunner() { StopFollowing(); }
 
 void OperationRunner::Run(const std::function<void(const std::function<void(const fileindex::OP&)>&)>& each,
                           const std::vector<std::string>& also_compare) {
   uint64_t operations = 0;
   each([&operations](const fileindex::OP&) { ++operations; });
   context_.status.BeginPass(operations);
+  tasks_.SetUrgent(operations <= kUrgentOperations);
   each([this](const fileindex::OP& op) { CarryOut(op, Stage::kMove); });
   FinishMoves();
+  follower_.Start();
   each([this](const fileindex::OP& op) {
     CarryOut(op, Stage::kLook);
-    KeepUp();
     context_.status.OperationDone();
   });
   for (const std::string& path : also_compare) CompareOnce(path);
-  LookAtWrittenAhead();
   tasks_.Wait();
+  StopFollowing();
+  follower_.Check();
+  LookAtWrittenAhead();
   RefreshSuspects();
   Commit();
 }
@@ -106,31 +115,9 @@ void OperationRunner::CheckRoot() const {
 
 /// What has been written becomes searchable and safe while a long pass goes on.
 void OperationRunner::CommitIfDue() {
+  follower_.Check();
   if (!writer_.HasUncommitted() || std::chrono::steady_clock::now() - last_commit_ < kCommitInterval) return;
   Commit();
-}
-
-/// While a long pass goes on, files that change meanwhile are written, too, so that they are found soon. Only that:
-/// their lines stay in the queue, whose pass carries them out again in its turn and decides, so that it does not matter
-/// what the present pass knew of these files. What is very much is left to that pass.
-void OperationRunner::KeepUp() {
-  if (std::chrono::steady_clock::now() - kept_up_ < context_.keep_up_interval) return;
-  constexpr size_t kAheadMax = 20000;
-  if (ahead_.size() > kAheadMax) return;
-  struct stat status = {};
-  bool any = false;
-  for (const std::string& path : tail_.NextChangedFiles()) {
-    if (LookAt(path, status) != Presence::kThere || !rules_.CanBeIndexed(path)) continue;
-    ahead_.insert(path);
-    context_.written_ahead.insert(path);
-    tasks_.Submit([this, path] { writer_.Write(path); });
-    any = true;
-  }
-  if (any) {
-    tasks_.Wait();
-    Commit();
-  }
-  kept_up_ = std::chrono::steady_clock::now();
 }
 
 /// Folding drops the delete of a file where the folder that it was in is a file now, since nothing in that folder could
@@ -141,7 +128,12 @@ void OperationRunner::LookAtWrittenAhead() {
     if (LookAt(path, status) == Presence::kGone) gone_.Add(path);
   }
   gone_.Flush();
-  context_.written_ahead = ahead_;
+  context_.written_ahead = follower_.Written();
+}
+
+void OperationRunner::StopFollowing() {
+  follower_.Stop();
+  context_.written_ahead.insert(follower_.Written().begin(), follower_.Written().end());
 }
 
 void OperationRunner::Commit() {
@@ -335,6 +327,7 @@ void OperationRunner::CompareFolder(const std::string& folder) {
   FERROX_FAIL_IF(!walk.Opened() && folder == context_.root, Error::kInternal, "the share's folder cannot be read");
   CheckRoot();
 
+  tasks_.SetUrgent(false);
   context_.status.BeginComparison(folder);
   CompareBelow(folder, walk, context_.index, Actions(folder));
   gone_.Flush();
@@ -359,7 +352,6 @@ ComparisonActions OperationRunner::Actions(const std::string& folder) {
     if (++examined == kFilesBeforeCount)
       *count = std::make_unique<FileCount>(folder, context_.folders, context_.status);
     CommitIfDue();
-    KeepUp();
   };
   return actions;
 }

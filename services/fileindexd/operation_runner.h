@@ -9,13 +9,13 @@
 #include <vector>
 
 #include "fileindex/optree.h"
+#include "services/fileindexd/change_follower.h"
 #include "services/fileindexd/comparison.h"
 #include "services/fileindexd/document_mover.h"
 #include "services/fileindexd/document_writer.h"
 #include "services/fileindexd/interruption.h"
 #include "services/fileindexd/path_rules.h"
 #include "services/fileindexd/paths_under_way.h"
-#include "services/fileindexd/queue_tail.h"
 #include "services/fileindexd/removal_batch.h"
 #include "services/fileindexd/share_folders.h"
 #include "services/fileindexd/share_index.h"
@@ -49,6 +49,9 @@ struct PassContext {
 class OperationRunner {
  public:
   explicit OperationRunner(const PassContext& context);
+  OperationRunner(const OperationRunner&) = delete;
+  OperationRunner& operator=(const OperationRunner&) = delete;
+  ~OperationRunner();
 
   /// Carries out what `each` hands over (it is called several times and hands over the same each time), and compares
   /// the paths `also_compare`.
@@ -86,7 +89,7 @@ class OperationRunner {
   void BeginMove(const std::vector<std::string>& paths);
   void FinishMoves();
   void CommitIfDue();
-  void KeepUp();
+  void StopFollowing();
   void LookAtWrittenAhead();
   void Commit();
 
@@ -110,13 +113,11 @@ class OperationRunner {
   PathsUnderWay under_way_;
   RemovalBatch gone_trees_;
   RemovalBatch gone_;
-  QueueTail tail_;
   const std::set<std::string> ahead_before_;  ///< written ahead of this pass
-  std::set<std::string> ahead_;               ///< by this pass
   std::set<std::string> compared_;
   bool had_reindex_ = false;
   std::chrono::steady_clock::time_point last_commit_ = std::chrono::steady_clock::now();
-  std::chrono::steady_clock::time_point kept_up_ = std::chrono::steady_clock::now();
+  ChangeFollower follower_;
 };
 
 }  // namespace ferrox::indexd

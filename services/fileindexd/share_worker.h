@@ -55,7 +55,7 @@ class ShareWorker {
     /// From the end of a pass to the beginning of the next: changes seldom come alone.
     std::chrono::milliseconds gather_time{100};
     /// A pass that takes longer looks so often for files that change meanwhile.
-    std::chrono::milliseconds keep_up_interval = std::chrono::seconds(1);
+    std::chrono::milliseconds keep_up_interval{200};
     /// While an operation goes on, an index may be missing or paused for a moment, or the event that tells of a rename.
     /// What takes longer than this was not finished.
     std::chrono::milliseconds patience = std::chrono::seconds(5);

@@ -8,11 +8,12 @@ namespace ferrox::indexd {
 namespace {
 
 constexpr size_t kWaitingPerThread = 8;
+constexpr unsigned kThreadsForUrgent = 2;
 
 }  // namespace
 
-TaskPool::TaskPool(unsigned threads) {
-  for (unsigned i = 0; i < std::max(threads, 2U); ++i) threads_.emplace_back([this] { Work(); });
+TaskPool::TaskPool(unsigned threads) : unhurried_max_(std::max(threads, 2U)) {
+  for (unsigned i = 0; i < unhurried_max_ + kThreadsForUrgent; ++i) threads_.emplace_back([this] { Work(); });
 }
 
 TaskPool::~TaskPool() {
@@ -24,27 +25,46 @@ TaskPool::~TaskPool() {
   for (std::thread& thread : threads_) thread.join();
 }
 
-void TaskPool::Work() {
-  while (true) {
-    Job job;
-    {
-      std::unique_lock lock(mutex_);
-      job_ready_.wait(lock, [this] { return stopping_ || !jobs_.empty(); });
-      if (jobs_.empty()) return;
-      job = std::move(jobs_.front());
-      jobs_.pop_front();
-    }
-    std::exception_ptr failure;
-    try {
-      const InterruptionScope scope(job.group->interruption_);
-      job.group->interruption_.Check();
-      if (!job.group->voided_.load()) job.task();
-    } catch (...) {
-      failure = std::current_exception();
-    }
-    job.task = nullptr;
-    job.group->Finish(std::move(failure));
+void TaskPool::Add(Job job) {
+  {
+    const std::lock_guard lock(mutex_);
+    (job.urgent ? urgent_ : unhurried_).push_back(std::move(job));
   }
+  job_ready_.notify_one();
+}
+
+TaskPool::Job TaskPool::Take() {
+  std::deque<Job>& jobs = urgent_.empty() ? unhurried_ : urgent_;
+  Job job = std::move(jobs.front());
+  jobs.pop_front();
+  unhurried_running_ += job.urgent ? 0 : 1;
+  return job;
+}
+
+void TaskPool::Work() {
+  std::unique_lock lock(mutex_);
+  while (true) {
+    job_ready_.wait(lock, [this] { return stopping_ || HasJob(); });
+    if (!HasJob()) return;
+    Job job = Take();
+    lock.unlock();
+    Run(job);
+    lock.lock();
+    unhurried_running_ -= job.urgent ? 0 : 1;
+  }
+}
+
+void TaskPool::Run(Job& job) {
+  std::exception_ptr failure;
+  try {
+    const InterruptionScope scope(job.group->interruption_);
+    job.group->interruption_.Check();
+    if (!job.group->voided_.load()) job.task();
+  } catch (...) {
+    failure = std::current_exception();
+  }
+  job.task = nullptr;
+  job.group->Finish(failure);
 }
 
 TaskGroup::~TaskGroup() {
@@ -61,11 +81,7 @@ void TaskGroup::Submit(std::function<void()> task) {
     RethrowFailure(lock);
     ++unfinished_;
   }
-  {
-    const std::lock_guard lock(pool_.mutex_);
-    pool_.jobs_.push_back({this, std::move(task)});
-  }
-  pool_.job_ready_.notify_one();
+  pool_.Add({this, urgent_, std::move(task)});
 }
 
 void TaskGroup::Wait() {

@@ -15,29 +15,39 @@ namespace ferrox::indexd {
 
 class TaskGroup;
 
-/// A fixed number of threads that carry out the tasks of several groups.
+/// A fixed number of threads that carry out the tasks of several groups. Urgent tasks go first, and two threads are
+/// kept for them, so that they wait for no other that has begun.
 class TaskPool {
  public:
-  /// At least two threads, so that one slow file does not hold up the others.
+  /// `threads` for tasks that are not urgent, at least two, so that one slow file does not hold up the others.
   explicit TaskPool(unsigned threads);
   TaskPool(const TaskPool&) = delete;
   TaskPool& operator=(const TaskPool&) = delete;
   /// Every group must be gone by then.
   ~TaskPool();
 
-  unsigned Threads() const { return static_cast<unsigned>(threads_.size()); }
+  /// Those for tasks that are not urgent.
+  unsigned Threads() const { return unhurried_max_; }
 
  private:
   friend class TaskGroup;
   struct Job {
-    TaskGroup* group;
+    TaskGroup* group = nullptr;
+    bool urgent = false;
     std::function<void()> task;
   };
+  void Add(Job job);
+  bool HasJob() const { return !urgent_.empty() || (!unhurried_.empty() && unhurried_running_ < unhurried_max_); }
+  Job Take();
   void Work();
+  static void Run(Job& job);
 
+  const unsigned unhurried_max_;
   std::mutex mutex_;
   std::condition_variable job_ready_;
-  std::deque<Job> jobs_;
+  std::deque<Job> urgent_;
+  std::deque<Job> unhurried_;
+  unsigned unhurried_running_ = 0;
   bool stopping_ = false;
   std::vector<std::thread> threads_;
 };
@@ -52,6 +62,8 @@ class TaskGroup {
   /// Waits for the tasks that have begun; drops the others.
   ~TaskGroup();
 
+  /// Whether the tasks submitted from now on are.
+  void SetUrgent(bool urgent) { urgent_ = urgent; }
   /// Queues a task; waits while several tasks a thread wait already. @throws what a task threw; Interrupted.
   void Submit(std::function<void()> task);
   /// Waits for all tasks. @throws likewise.
@@ -64,6 +76,7 @@ class TaskGroup {
 
   TaskPool& pool_;
   const Interruption& interruption_;
+  bool urgent_ = false;
   std::mutex mutex_;
   std::condition_variable done_;
   size_t unfinished_ = 0;

@@ -29,7 +29,8 @@ class WorkerPool {
     /// The path of each program, of those too that are not installed.
     std::array<std::string, kova::content::kPrograms> programs;
     std::string empty_folder;  ///< what workers see of the file system, where that can be arranged
-    unsigned workers_max = std::max(std::thread::hardware_concurrency(), 1U);
+    /// Two more than the index daemon reads at a time while nothing is urgent.
+    unsigned workers_max = std::max(std::thread::hardware_concurrency(), 2U) + 2;
     unsigned files_per_worker = 200;
     std::chrono::milliseconds longest_read = std::chrono::seconds(30);
     std::chrono::milliseconds idle_time = std::chrono::seconds(30);

@@ -38,6 +38,7 @@ class FakeIndex : public indexd::ShareIndex {
 
   void Resume() override { paused = false; }
   void Upsert(const std::string& path, bool need_meta) override {
+    if (before_read) before_read(path);
     const Document document = {StampOf(path), need_meta, need_meta ? ContentOf(path) : ""};
     const std::lock_guard lock(mutex);
     if (before_write) before_write(path);
@@ -120,6 +121,7 @@ class FakeIndex : public indexd::ShareIndex {
   int renames = 0;
   int lists = 0;
   int commits = 0;
+  std::function<void(const std::string& path)> before_read;  ///< by several threads
   std::function<void(const std::string& path)> before_write;
   std::function<void(const std::string& path)> before_attr;
 

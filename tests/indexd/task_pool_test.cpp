@@ -32,6 +32,31 @@ TEST(TaskPoolTest, FirstFailureComesOutAndVoidsWhatHasNotBegunOfItsGroup) {
   EXPECT_GE(beside, begun);
 }
 
+TEST(TaskPoolTest, UrgentTaskWaitsForNoOther) {
+  TaskPool pool(2);
+  const Interruption interruption;
+  TaskGroup slow(pool, interruption);
+  TaskGroup urgent(pool, interruption);
+  urgent.SetUrgent(true);
+  std::mutex mutex;
+  mutex.lock();
+  std::atomic<int> running{0};
+  for (int i = 0; i < 10; ++i) {
+    slow.Submit([&] {
+      ++running;
+      const std::lock_guard wait(mutex);
+    });
+  }
+  std::atomic<int> done{0};
+  for (int i = 0; i < 100; ++i) urgent.Submit([&done] { ++done; });
+  urgent.Wait();
+  EXPECT_EQ(100, done);
+  EXPECT_LE(running, 2);
+  mutex.unlock();
+  slow.Wait();
+  EXPECT_EQ(10, running);
+}
+
 TEST(TaskPoolTest, InterruptionEndsSleepsInTasks) {
   const InterruptibleClock clock;
   TaskPool pool(2);
