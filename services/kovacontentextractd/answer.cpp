@@ -1,5 +1,7 @@
 #include "services/kovacontentextractd/answer.h"
 
+#include <array>
+#include <charconv>
 #include <map>
 #include <utility>
 
@@ -58,11 +60,19 @@ Types MakeTypes() {
   return types;
 }
 
+/// The number with as few digits as tell it from its neighbours: 2.8, not 2.7999999999999998.
+std::string Shortest(double number) {
+  std::array<char, 32> text;
+  const auto end = std::to_chars(text.data(), text.data() + text.size(), number).ptr;
+  return {text.data(), end};
+}
+
 /// `value` as the index takes it; null when it is not of that type.
 Json::Value OfType(Type type, const Json::Value& value) {
   if (type == Type::kBool) return value.isBool() ? value : Json::Value();
   if (type == Type::kInteger) return value.isInt64() ? Json::Value(value.asInt64()) : Json::Value();
   if (type == Type::kNumber) return value.isNumeric() ? Json::Value(value.asDouble()) : Json::Value();
+  if (value.isDouble() && !value.isInt64()) return Shortest(value.asDouble());
   if (value.isNumeric()) return toString(value);
   return value.isString() && value.asString().size() <= kFieldMaxBytes ? value : Json::Value();
 }

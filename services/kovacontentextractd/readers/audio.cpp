@@ -1,6 +1,5 @@
 #include "services/kovacontentextractd/readers/audio.h"
 
-#include <charconv>
 #include <exception>
 #include <memory>
 #include <new>
@@ -13,88 +12,25 @@
 #include <taglib/mp4file.h>
 #include <taglib/mpcfile.h>
 #include <taglib/mpegfile.h>
+#include <taglib/oggflacfile.h>
+#include <taglib/oggpageheader.h>
 #include <taglib/opusfile.h>
 #include <taglib/speexfile.h>
 #include <taglib/tdebuglistener.h>
 #include <taglib/tpropertymap.h>
+#include <taglib/trueaudiofile.h>
 #include <taglib/vorbisfile.h>
 #include <taglib/wavfile.h>
 #include <taglib/wavpackfile.h>
 
+#include "services/kovacontentextractd/readers/audio_chunks.h"
 #include "services/kovacontentextractd/readers/audio_stream.h"
-#include "services/kovacontentextractd/readers/latin1.h"
-#include "services/kovacontentextractd/readers/times.h"
+#include "services/kovacontentextractd/readers/audio_tags.h"
+#include "services/kovacontentextractd/readers/little_endian.h"
 
 namespace ferrox::extract {
 
 namespace {
-
-struct TagField {
-  const char* tag;
-  const char* field;
-};
-
-constexpr TagField kTextTags[] = {
-    {"TITLE", "KOVAMDTitle"},
-    {"ALBUM", "KOVAMDAlbum"},
-    {"ARTIST", "KOVAMDAuthors"},
-    {"ALBUMARTIST", "KOVAMDAuthors"},
-    {"PERFORMER", "KOVAMDContributors"},
-    {"CONDUCTOR", "KOVAMDContributors"},
-    {"COMPOSER", "KOVAMDComposer"},
-    {"LYRICIST", "KOVAMDLyricist"},
-    {"GENRE", "KOVAMDMusicalGenre"},
-    {"COMMENT", "KOVAMDComment"},
-    {"DESCRIPTION", "KOVAMDDescription"},
-    {"COPYRIGHT", "KOVAMDCopyright"},
-    {"LABEL", "KOVAMDPublishers"},
-    {"LANGUAGE", "KOVAMDLanguages"},
-    {"INITIALKEY", "KOVAMDKeySignature"},
-    {"BPM", "KOVAMDTempo"},
-    {"ENCODING", "KOVAMDAudioEncodingApplication"},
-    {"ENCODEDBY", "KOVAMDEncodingApplications"},
-};
-
-int64_t LeadingNumber(const std::string& text) {
-  int64_t number = 0;
-  (void)std::from_chars(text.data(), text.data() + text.size(), number);
-  return number;
-}
-
-/// The encoding of the texts that are no Latin-1 although their tag says so; empty when they may be.
-std::string EncodingOf(const TagLib::PropertyMap& tags) {
-  std::string texts;
-  for (const TagField& row : kTextTags) {
-    const auto found = tags.find(row.tag);
-    if (found == tags.end()) continue;
-    for (const TagLib::String& value : found->second) {
-      if (value.isLatin1() && !value.isAscii() && texts.size() < 4096) texts += value.to8Bit(true) + "\n";
-    }
-  }
-  return TrueEncoding(texts);
-}
-
-void AddTags(const TagLib::PropertyMap& tags, Findings& findings) {
-  const std::string encoding = EncodingOf(tags);
-  for (const TagField& row : kTextTags) {
-    const auto found = tags.find(row.tag);
-    if (found == tags.end()) continue;
-    for (const TagLib::String& value : found->second) {
-      const std::string text = WithoutDoubleEncoding(value.to8Bit(true));
-      findings.Append(row.field, encoding.empty() ? text : InTrueEncoding(text, encoding));
-    }
-  }
-  const auto first = [&](const char* tag) {
-    const auto found = tags.find(tag);
-    return found != tags.end() && !found->second.isEmpty() ? found->second.front().to8Bit(true) : std::string();
-  };
-  const int64_t track = LeadingNumber(first("TRACKNUMBER")), year = LeadingNumber(first("DATE"));
-  if (track > 0) findings.SetInteger("KOVAMDAudioTrackNumber", track);
-  if (year > 0 && year <= 9999) findings.SetInteger("KOVAMDRecordingYear", year);
-  if (const auto time = ParseTime(first("DATE"))) findings.SetInteger("KOVAMDContentCreationDate", *time);
-  const auto words = tags.find("LYRICS");
-  if (words != tags.end()) (void)findings.AddText(words->second.toString("\n").to8Bit(true));
-}
 
 void AddProperties(const TagLib::AudioProperties& properties, Findings& findings) {
   findings.Set("KOVAMDMediaTypes", "Sound");
@@ -106,9 +42,41 @@ void AddProperties(const TagLib::AudioProperties& properties, Findings& findings
   if (properties.channels() > 0) findings.SetInteger("KOVAMDAudioChannelCount", properties.channels());
 }
 
+/// By the number that a WAV file has for it.
+const char* WavCodec(int format) {
+  switch (format) {
+    case 1:
+    case 3:
+      return "PCM";
+    case 2:
+    case 0x11:
+      return "ADPCM";
+    case 6:
+      return "A-law";
+    case 7:
+      return "mu-law";
+    case 0x50:
+      return "MP2";
+    case 0x55:
+      return "MP3";
+    default:
+      return "";
+  }
+}
+
 const char* CodecOf(const TagLib::File& file) {
-  if (dynamic_cast<const TagLib::MPEG::File*>(&file) != nullptr) return "MP3";
+  if (const auto* mpeg = dynamic_cast<const TagLib::MPEG::File*>(&file)) {
+    return mpeg->audioProperties() != nullptr && mpeg->audioProperties()->layer() == 2 ? "MP2" : "MP3";
+  }
+  if (const auto* mp4 = dynamic_cast<const TagLib::MP4::File*>(&file)) {
+    if (mp4->audioProperties() == nullptr) return "";
+    return mp4->audioProperties()->codec() == TagLib::MP4::Properties::ALAC ? "ALAC" : "AAC";
+  }
+  if (const auto* wav = dynamic_cast<const TagLib::RIFF::WAV::File*>(&file)) {
+    return wav->audioProperties() != nullptr ? WavCodec(wav->audioProperties()->format()) : "";
+  }
   if (dynamic_cast<const TagLib::FLAC::File*>(&file) != nullptr) return "FLAC";
+  if (dynamic_cast<const TagLib::Ogg::FLAC::File*>(&file) != nullptr) return "FLAC";
   if (dynamic_cast<const TagLib::Ogg::Vorbis::File*>(&file) != nullptr) return "Vorbis";
   if (dynamic_cast<const TagLib::Ogg::Opus::File*>(&file) != nullptr) return "Opus";
   if (dynamic_cast<const TagLib::Ogg::Speex::File*>(&file) != nullptr) return "Speex";
@@ -116,17 +84,33 @@ const char* CodecOf(const TagLib::File& file) {
   if (dynamic_cast<const TagLib::WavPack::File*>(&file) != nullptr) return "WavPack";
   if (dynamic_cast<const TagLib::MPC::File*>(&file) != nullptr) return "Musepack";
   if (dynamic_cast<const TagLib::ASF::File*>(&file) != nullptr) return "WMA";
-  if (dynamic_cast<const TagLib::RIFF::WAV::File*>(&file) != nullptr) return "PCM";
+  if (dynamic_cast<const TagLib::TrueAudio::File*>(&file) != nullptr) return "TTA";
   if (dynamic_cast<const TagLib::RIFF::AIFF::File*>(&file) != nullptr) return "PCM";
-  const auto* mp4 = dynamic_cast<const TagLib::MP4::File*>(&file);
-  if (mp4 == nullptr || mp4->audioProperties() == nullptr) return "";
-  return mp4->audioProperties()->codec() == TagLib::MP4::Properties::ALAC ? "ALAC" : "AAC";
+  return "";
 }
 
-uint64_t LittleAt(const std::string& bytes, size_t at, int count) {
-  uint64_t value = 0;
-  for (int i = count - 1; i >= 0; --i) value = value << 8 | static_cast<uint8_t>(bytes[at + static_cast<size_t>(i)]);
-  return value;
+/// The library reads the tags of each format, but not all that says the same in other places of the file.
+void AddOtherTexts(const Source& source, TagLib::File& file, TagLib::PropertyMap& tags) {
+  if (dynamic_cast<const TagLib::RIFF::AIFF::File*>(&file) != nullptr) AddAiffTexts(source, tags);
+  const auto* wav = dynamic_cast<const TagLib::RIFF::WAV::File*>(&file);
+  if (wav == nullptr || !wav->hasInfoTag()) return;
+  static constexpr std::pair<const char*, const char*> kInfo[] = {{"ICOP", "COPYRIGHT"},
+                                                                  {"ISFT", "ENCODING"},
+                                                                  {"IENG", "PERFORMER"},
+                                                                  {"ILNG", "LANGUAGE"},
+                                                                  {"ISBJ", "DESCRIPTION"}};
+  for (const auto& [name, tag] : kInfo) AddText(tag, wav->InfoTag()->fieldText(name).to8Bit(true), tags);
+}
+
+/// FLAC in Ogg that was written as it was recorded does not know its length; its last page does.
+void AddOggLength(TagLib::File& file, Findings& findings) {
+  auto* ogg = dynamic_cast<TagLib::Ogg::FLAC::File*>(&file);
+  if (ogg == nullptr || ogg->audioProperties() == nullptr || ogg->audioProperties()->lengthInMilliseconds() > 0) return;
+  const int rate = ogg->audioProperties()->sampleRate();
+  const TagLib::Ogg::PageHeader* last = ogg->lastPageHeader();
+  if (rate > 0 && last != nullptr && last->absoluteGranularPosition() > 0) {
+    findings.SetNumber("KOVAMDDurationSecond", static_cast<double>(last->absoluteGranularPosition()) / rate);
+  }
 }
 
 /// DSF: two chunks of fixed size, and at the end a tag as MP3 has it. The library does not know it.
@@ -135,13 +119,14 @@ void ReadDsf(const Source& source, const std::string& head, Findings& findings) 
   if (head.size() < kHeadBytes || head.compare(28, 4, "fmt ") != 0) return findings.Fail("damaged");
   findings.Set("KOVAMDMediaTypes", "Sound");
   findings.Set("KOVAMDCodecs", "DSD");
-  const uint64_t channels = LittleAt(head, 52, 4), rate = LittleAt(head, 56, 4), samples = LittleAt(head, 64, 8);
+  const uint64_t channels = LittleEndian(head, 52, 4), rate = LittleEndian(head, 56, 4),
+                 samples = LittleEndian(head, 64, 8);
   if (rate > 0) findings.SetNumber("KOVAMDDurationSecond", static_cast<double>(samples) / static_cast<double>(rate));
   findings.SetInteger("KOVAMDAudioSampleRate", static_cast<int64_t>(rate));
   findings.SetInteger("KOVAMDAudioChannelCount", static_cast<int64_t>(channels));
-  findings.SetInteger("KOVAMDBitsPerSample", static_cast<int64_t>(LittleAt(head, 60, 4)));
+  findings.SetInteger("KOVAMDBitsPerSample", static_cast<int64_t>(LittleEndian(head, 60, 4)));
   findings.SetInteger("KOVAMDAudioBitRate", static_cast<int64_t>(rate * channels));
-  const uint64_t tag_at = LittleAt(head, 20, 8);
+  const uint64_t tag_at = LittleEndian(head, 20, 8);
   if (tag_at == 0 || tag_at >= source.size) return;
   AudioStream tag(source, tag_at, source.size, "tag.mp3");
   const TagLib::MPEG::File file(&tag, TagLib::ID3v2::FrameFactory::instance(), false);
@@ -151,10 +136,13 @@ void ReadDsf(const Source& source, const std::string& head, Findings& findings) 
 void ReadTagged(const Source& source, Findings& findings) {
   AudioStream stream(source, 0, source.size, "file." + source.extension);
   const TagLib::FileRef reference(&stream);
-  const TagLib::File* file = reference.file();
+  TagLib::File* file = reference.file();
   if (reference.isNull() || !file->isValid()) return findings.Fail("damaged");
-  AddTags(file->properties(), findings);
+  TagLib::PropertyMap tags = file->properties();
+  AddOtherTexts(source, *file, tags);
+  AddTags(tags, findings);
   if (file->audioProperties() != nullptr) AddProperties(*file->audioProperties(), findings);
+  AddOggLength(*file, findings);
   findings.Set("KOVAMDCodecs", CodecOf(*file));
 }
 
@@ -176,6 +164,7 @@ void ReadAudio(const Source& source, Findings& findings) {
   try {
     const std::string head = FileBytes(source).ReadAt(0, 80);
     if (head.compare(0, 4, "DSD ") == 0) return ReadDsf(source, head, findings);
+    if (ReadAu(source, findings) || ReadCaf(source, findings)) return;
     ReadTagged(source, findings);
   } catch (const std::bad_alloc&) {
     findings.Fail("needs too much memory");

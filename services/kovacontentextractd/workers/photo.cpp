@@ -2,11 +2,16 @@
 
 #include "services/kovacontentextractd/readers/photo/photo.h"
 
+#include "services/kovacontentextractd/readers/encoding.h"
 #include "services/kovacontentextractd/worker.h"
 
 using namespace ferrox::extract;
 
 int main(int argc, char** argv) {
   static constexpr ReaderRow kReader = {"photo", &ReadPhoto};
-  return RunWorker({&kReader, 1, &PreparePhoto}, argc > 1 ? argv[1] : nullptr);
+  const auto prepare = [] {
+    PreparePhoto();
+    LoadConverters();
+  };
+  return RunWorker({&kReader, 1, prepare}, argc > 1 ? argv[1] : nullptr);
 }

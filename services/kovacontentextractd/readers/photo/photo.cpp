@@ -8,6 +8,8 @@
 
 #include "services/kovacontentextractd/readers/latin1.h"
 #include "services/kovacontentextractd/readers/mapped_file.h"
+#include "services/kovacontentextractd/readers/photo/gif.h"
+#include "services/kovacontentextractd/readers/photo/heif.h"
 #include "services/kovacontentextractd/readers/times.h"
 
 namespace ferrox::extract {
@@ -26,6 +28,7 @@ struct Row {
 constexpr Row kExifRows[] = {
     {"Exif.Image.Make", "KOVAMDAcquisitionMake"},
     {"Exif.Image.Model", "KOVAMDAcquisitionModel"},
+    {"Exif.Image.UniqueCameraModel", "KOVAMDAcquisitionModel"},
     {"Exif.Image.Software", "KOVAMDCreator"},
     {"Exif.Image.ImageDescription", "KOVAMDDescription"},
     {"Exif.Image.Copyright", "KOVAMDCopyright"},
@@ -42,7 +45,6 @@ constexpr Row kExifRows[] = {
     {"Exif.Photo.FNumber", "KOVAMDAperture", Kind::kShown},
     {"Exif.Photo.MaxApertureValue", "KOVAMDMaxAperture", Kind::kNumber},
     {"Exif.Photo.FocalLength", "KOVAMDFocalLength", Kind::kNumber},
-    {"Exif.Photo.ISOSpeedRatings", "KOVAMDISOSpeed", Kind::kInteger},
     {"Exif.Photo.ExposureProgram", "KOVAMDExposureProgram", Kind::kShown},
     {"Exif.Photo.ExposureMode", "KOVAMDExposureMode", Kind::kShown},
     {"Exif.Photo.MeteringMode", "KOVAMDMeteringMode", Kind::kShown},
@@ -83,6 +85,13 @@ constexpr Row kXmpRows[] = {
     {"Xmp.xmp.CreatorTool", "KOVAMDCreator"},
 };
 
+/// What programs copy out of EXIF, and in some files is all that is left of it.
+constexpr Row kCopiedRows[] = {
+    {"Xmp.tiff.Make", "KOVAMDAcquisitionMake"},
+    {"Xmp.tiff.Model", "KOVAMDAcquisitionModel"},
+    {"Xmp.exif.UserComment", "KOVAMDComment"},
+};
+
 bool IsList(const std::string& field) {
   return field == "KOVAMDKeywords" || field == "KOVAMDAuthors" || field == "KOVAMDPeopleDisplayName";
 }
@@ -103,10 +112,13 @@ class Fields {
   std::string Value(const char* field) const { return values_.get(field, "").asString(); }
 
  private:
-  /// Without blanks at the end, which cameras fill up with; what is not UTF-8 is read as Latin-1.
+  /// Without blanks at the end, which cameras fill up with; what is not UTF-8 is read as Latin-1, unless it looks like
+  /// Cyrillic or East Asian text.
   static std::string Cleaned(std::string text) {
     text.resize(text.find_last_not_of(std::string_view("\0 \t\r\n", 5)) + 1);
-    return Utf8OrLatin1(text);
+    const std::string clean = Utf8OrLatin1(text);
+    const std::string encoding = clean != text ? TrueEncoding(clean) : std::string();
+    return encoding.empty() ? clean : InTrueEncoding(clean, encoding);
   }
 
   Findings& findings_;
@@ -127,6 +139,12 @@ void AddValue(const Row& row, const Exiv2::Value& value, Fields& fields) {
   for (long i = 0; i < std::min(value.count(), kItemsMax); ++i) fields.Add(row.field, value.toString(i));
 }
 
+/// Rational numbers as exactly as people wrote them: 2.8 is no 2.7999999523.
+double NumberOf(const Exiv2::Exifdatum& datum) {
+  const Exiv2::Rational number = datum.toRational();
+  return number.second != 0 ? static_cast<double>(number.first) / number.second : static_cast<double>(datum.toFloat());
+}
+
 void AddExif(const Exiv2::ExifData& exif, Fields& fields, Findings& findings) {
   for (const Row& row : kExifRows) {
     const auto found = exif.findKey(Exiv2::ExifKey(row.key));
@@ -134,7 +152,7 @@ void AddExif(const Exiv2::ExifData& exif, Fields& fields, Findings& findings) {
     if (row.kind == Kind::kInteger) {
       findings.SetInteger(row.field, found->toLong());
     } else if (row.kind == Kind::kNumber) {
-      findings.SetNumber(row.field, static_cast<double>(found->toFloat()));
+      findings.SetNumber(row.field, NumberOf(*found));
     } else if (row.kind == Kind::kShown) {
       fields.Add(row.field, found->print(&exif));
     } else {
@@ -158,27 +176,50 @@ std::string TextOf(const Exiv2::ExifData& exif, const char* key) {
   return found != exif.end() ? found->toString() : std::string();
 }
 
-void AddTimes(const Exiv2::ExifData& exif, const Exiv2::XmpData& xmp, Findings& findings) {
-  auto taken = ParseTime(TextOf(exif, "Exif.Photo.DateTimeOriginal") + TextOf(exif, "Exif.Photo.OffsetTimeOriginal"));
-  if (!taken.has_value()) taken = ParseTime(TextOf(exif, "Exif.Photo.DateTimeDigitized"));
-  const auto created = xmp.findKey(Exiv2::XmpKey("Xmp.xmp.CreateDate"));
-  if (!taken.has_value() && created != xmp.end()) taken = ParseTime(created->toString());
-  const auto changed = ParseTime(TextOf(exif, "Exif.Image.DateTime") + TextOf(exif, "Exif.Photo.OffsetTime"));
-  if (!taken.has_value()) taken = changed;
-  if (taken.has_value()) findings.SetInteger("KOVAMDContentCreationDate", *taken);
-  if (changed.has_value()) findings.SetInteger("KOVAMDContentModificationDate", *changed);
+std::string TextOf(const Exiv2::XmpData& xmp, const char* key) {
+  const auto found = xmp.findKey(Exiv2::XmpKey(key));
+  return found != xmp.end() ? found->toString() : std::string();
+}
+
+std::string TextOf(const Exiv2::IptcData& iptc, const char* key) {
+  const auto found = iptc.findKey(Exiv2::IptcKey(key));
+  return found != iptc.end() ? found->toString() : std::string();
+}
+
+/// When the picture was taken, else when it was digitized, made or changed.
+void AddTimes(const Exiv2::Image& image, Findings& findings) {
+  const Exiv2::ExifData& exif = image.exifData();
+  const Exiv2::XmpData& xmp = image.xmpData();
+  const Exiv2::IptcData& iptc = image.iptcData();
+  const std::string changed = TextOf(exif, "Exif.Image.DateTime") + TextOf(exif, "Exif.Photo.OffsetTime");
+  for (const std::string& text :
+       {TextOf(exif, "Exif.Photo.DateTimeOriginal") + TextOf(exif, "Exif.Photo.OffsetTimeOriginal"),
+        TextOf(exif, "Exif.Image.DateTimeOriginal"), TextOf(xmp, "Xmp.exif.DateTimeOriginal"),
+        TextOf(exif, "Exif.Photo.DateTimeDigitized"), TextOf(xmp, "Xmp.photoshop.DateCreated"),
+        TextOf(iptc, "Iptc.Application2.DateCreated") + " " + TextOf(iptc, "Iptc.Application2.TimeCreated"),
+        TextOf(xmp, "Xmp.xmp.CreateDate"), changed}) {
+    const auto taken = ParseTime(text);
+    if (!taken.has_value()) continue;
+    findings.SetInteger("KOVAMDContentCreationDate", *taken);
+    break;
+  }
+  if (const auto time = ParseTime(changed)) findings.SetInteger("KOVAMDContentModificationDate", *time);
 }
 
 /// Exposures are shown as photographers write them: "1/250", "2".
 void AddExposure(const Exiv2::ExifData& exif, Findings& findings) {
   const auto found = exif.findKey(Exiv2::ExifKey("Exif.Photo.ExposureTime"));
   if (found != exif.end() && found->count() > 0) {
-    const double seconds = static_cast<double>(found->toFloat());
+    const double seconds = NumberOf(*found);
     if (seconds > 0 && seconds < 1) {
       findings.Set("KOVAMDExposureTimeString", "1/" + std::to_string(std::llround(std::min(1 / seconds, 1e9))));
     } else if (seconds >= 1 && seconds < 1e9) {
       findings.Set("KOVAMDExposureTimeString", std::to_string(std::llround(seconds)));
     }
+  }
+  const auto speed = Exiv2::isoSpeed(exif);  // of some cameras, only what the maker adds has it
+  if (speed != exif.end() && speed->count() > 0 && speed->toLong() > 0) {
+    findings.SetInteger("KOVAMDISOSpeed", speed->toLong());
   }
   const auto flash = exif.findKey(Exiv2::ExifKey("Exif.Photo.Flash"));
   if (flash != exif.end() && flash->count() > 0) findings.SetInteger("KOVAMDFlashOnOff", flash->toLong() & 1);
@@ -205,6 +246,28 @@ void AddPixels(const Exiv2::Image& image, Findings& findings) {
   findings.SetInteger("KOVAMDPixelCount", width * height);
 }
 
+/// Names that programs give faces, and places that they write in several parts.
+void AddNamedParts(const Exiv2::XmpData& xmp, Fields& fields) {
+  static constexpr struct {
+    const char* within;
+    const char* end;
+    const char* field;
+  } kParts[] = {
+      {"Xmp.mwg-rs.Regions/", "/mwg-rs:Name", "KOVAMDPeopleDisplayName"},
+      {"Xmp.MP.RegionInfo/", "/MPReg:PersonDisplayName", "KOVAMDPeopleDisplayName"},
+      {"Xmp.iptcExt.LocationCreated", "/Iptc4xmpExt:Sublocation", "KOVAMDNamedLocation"},
+      {"Xmp.iptcExt.LocationCreated", "/Iptc4xmpExt:City", "KOVAMDCity"},
+      {"Xmp.iptcExt.LocationCreated", "/Iptc4xmpExt:ProvinceState", "KOVAStateOrProvince"},
+      {"Xmp.iptcExt.LocationCreated", "/Iptc4xmpExt:CountryName", "KOVAMDCountry"},
+  };
+  for (const auto& datum : xmp) {
+    const std::string key = datum.key();
+    for (const auto& part : kParts) {
+      if (key.starts_with(part.within) && key.ends_with(part.end)) fields.Add(part.field, datum.toString());
+    }
+  }
+}
+
 /// The names of the place together, from the nearest to the widest.
 void AddPlace(const Fields& fields, Findings& findings) {
   std::string place;
@@ -213,6 +276,22 @@ void AddPlace(const Fields& fields, Findings& findings) {
     if (!name.empty()) place += (place.empty() ? "" : ", ") + name;
   }
   findings.Set("KOVAMDNamedLocation", place);
+}
+
+void AddGifTexts(const MappedFile& file, Exiv2::Image& image, Fields& fields) {
+  const GifTexts texts = ReadGifTexts({reinterpret_cast<const char*>(file.Data()), file.Size()});
+  if (!texts.xmp.empty()) (void)Exiv2::XmpParser::decode(image.xmpData(), texts.xmp);
+  fields.Add("KOVAMDComment", texts.comment);
+}
+
+/// The library finds these parts in some HEIF files only.
+void AddHeifParts(const MappedFile& file, Exiv2::Image& image) {
+  const HeifParts parts = ReadHeifParts({reinterpret_cast<const char*>(file.Data()), file.Size()});
+  if (!parts.exif.empty() && image.exifData().empty()) {
+    (void)Exiv2::ExifParser::decode(image.exifData(), reinterpret_cast<const Exiv2::byte*>(parts.exif.data()),
+                                    static_cast<uint32_t>(parts.exif.size()));
+  }
+  if (!parts.xmp.empty() && image.xmpData().empty()) (void)Exiv2::XmpParser::decode(image.xmpData(), parts.xmp);
 }
 
 void ReadImage(const MappedFile& file, Findings& findings) {
@@ -224,11 +303,16 @@ void ReadImage(const MappedFile& file, Findings& findings) {
   }
   Fields fields(findings);
   AddPixels(*image, findings);
+  AddHeifParts(file, *image);
+  if (image->mimeType() == "image/gif") AddGifTexts(file, *image, fields);
   // What people wrote with programs counts more than what cameras put there.
   AddRows<Exiv2::XmpData, Exiv2::XmpKey>(image->xmpData(), kXmpRows, fields);
+  AddNamedParts(image->xmpData(), fields);
   AddRows<Exiv2::IptcData, Exiv2::IptcKey>(image->iptcData(), kIptcRows, fields);
   AddExif(image->exifData(), fields, findings);
-  AddTimes(image->exifData(), image->xmpData(), findings);
+  AddRows<Exiv2::XmpData, Exiv2::XmpKey>(image->xmpData(), kCopiedRows, fields);
+  fields.Add("KOVAMDComment", image->comment());
+  AddTimes(*image, findings);
   AddExposure(image->exifData(), findings);
   AddResolution(image->exifData(), findings);
   AddPlace(fields, findings);

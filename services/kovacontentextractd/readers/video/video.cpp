@@ -38,15 +38,31 @@ struct Row {
 constexpr Row kRows[] = {
     {MediaInfoLib::Stream_General, L"Title", "KOVAMDTitle"},
     {MediaInfoLib::Stream_General, L"Movie", "KOVAMDTitle"},
+    {MediaInfoLib::Stream_General, L"Track", "KOVAMDTitle"},
+    {MediaInfoLib::Stream_General, L"com.apple.quicktime.title", "KOVAMDTitle"},
+    {MediaInfoLib::Stream_General, L"com.apple.quicktime.displayname", "KOVAMDTitle"},
     {MediaInfoLib::Stream_General, L"Album", "KOVAMDAlbum"},
+    {MediaInfoLib::Stream_General, L"Collection", "KOVAMDAlbum"},
     {MediaInfoLib::Stream_General, L"Performer", "KOVAMDAuthors"},
+    {MediaInfoLib::Stream_General, L"Album/Performer", "KOVAMDAuthors"},
+    {MediaInfoLib::Stream_General, L"com.apple.quicktime.author", "KOVAMDAuthors"},
+    {MediaInfoLib::Stream_General, L"com.apple.quicktime.artist", "KOVAMDAuthors"},
     {MediaInfoLib::Stream_General, L"Director", "KOVAMDContributors"},
+    {MediaInfoLib::Stream_General, L"com.apple.quicktime.director", "KOVAMDContributors"},
+    {MediaInfoLib::Stream_General, L"WrittenBy", "KOVAMDContributors"},
     {MediaInfoLib::Stream_General, L"Actor", "KOVAMDParticipants"},
     {MediaInfoLib::Stream_General, L"Composer", "KOVAMDComposer"},
     {MediaInfoLib::Stream_General, L"Genre", "KOVAMDMusicalGenre"},
     {MediaInfoLib::Stream_General, L"Comment", "KOVAMDComment"},
     {MediaInfoLib::Stream_General, L"Description", "KOVAMDDescription"},
     {MediaInfoLib::Stream_General, L"Synopsis", "KOVAMDDescription"},
+    {MediaInfoLib::Stream_General, L"com.apple.quicktime.comment", "KOVAMDComment"},
+    {MediaInfoLib::Stream_General, L"com.apple.quicktime.description", "KOVAMDDescription"},
+    {MediaInfoLib::Stream_General, L"com.apple.quicktime.keywords", "KOVAMDKeywords"},
+    {MediaInfoLib::Stream_General, L"Make", "KOVAMDAcquisitionMake"},
+    {MediaInfoLib::Stream_General, L"Model", "KOVAMDAcquisitionModel"},
+    {MediaInfoLib::Stream_General, L"com.apple.quicktime.make", "KOVAMDAcquisitionMake"},
+    {MediaInfoLib::Stream_General, L"com.apple.quicktime.model", "KOVAMDAcquisitionModel"},
     {MediaInfoLib::Stream_General, L"Keywords", "KOVAMDKeywords"},
     {MediaInfoLib::Stream_General, L"Copyright", "KOVAMDCopyright"},
     {MediaInfoLib::Stream_General, L"Publisher", "KOVAMDPublishers"},
@@ -56,13 +72,44 @@ constexpr Row kRows[] = {
     {MediaInfoLib::Stream_General, L"OverallBitRate", "KOVAMDTotalBitRate", Kind::kInteger},
     {MediaInfoLib::Stream_General, L"Recorded_Date", "KOVAMDRecordingYear", Kind::kYear},
     {MediaInfoLib::Stream_General, L"Encoded_Date", "KOVAMDContentCreationDate", Kind::kTime},
+    {MediaInfoLib::Stream_General, L"Mastered_Date", "KOVAMDContentCreationDate", Kind::kTime},
     {MediaInfoLib::Stream_General, L"Recorded_Date", "KOVAMDContentCreationDate", Kind::kTime},
+    {MediaInfoLib::Stream_General, L"com.apple.quicktime.creationdate", "KOVAMDContentCreationDate", Kind::kTime},
+    {MediaInfoLib::Stream_General, L"Track/Position", "KOVAMDAudioTrackNumber", Kind::kInteger},
     {MediaInfoLib::Stream_Video, L"Width", "KOVAMDPixelWidth", Kind::kInteger},
     {MediaInfoLib::Stream_Video, L"Height", "KOVAMDPixelHeight", Kind::kInteger},
     {MediaInfoLib::Stream_Video, L"BitRate", "KOVAMDVideoBitRate", Kind::kInteger},
     {MediaInfoLib::Stream_Audio, L"BitRate", "KOVAMDAudioBitRate", Kind::kInteger},
     {MediaInfoLib::Stream_Audio, L"SamplingRate", "KOVAMDAudioSampleRate", Kind::kInteger},
     {MediaInfoLib::Stream_Audio, L"Channel(s)", "KOVAMDAudioChannelCount", Kind::kInteger},
+};
+
+/// Names of tags as programs write them into files; the library has names of its own only for those that it expects.
+constexpr struct {
+  const wchar_t* names[2];
+  const char* field;
+} kFreeTags[] = {
+    {{L"TITLE", L"title"}, "KOVAMDTitle"},
+    {{L"ALBUM", L"album"}, "KOVAMDAlbum"},
+    {{L"ARTIST", L"artist"}, "KOVAMDAuthors"},
+    {{L"DIRECTOR", L"director"}, "KOVAMDContributors"},
+    {{L"ACTOR", L"actor"}, "KOVAMDParticipants"},
+    {{L"COMPOSER", L"composer"}, "KOVAMDComposer"},
+    {{L"GENRE", L"genre"}, "KOVAMDMusicalGenre"},
+    {{L"COMMENT", L"comment"}, "KOVAMDComment"},
+    {{L"DESCRIPTION", L"description"}, "KOVAMDDescription"},
+    {{L"SYNOPSIS", L"synopsis"}, "KOVAMDDescription"},
+    {{L"SUMMARY", L"summary"}, "KOVAMDDescription"},
+    {{L"KEYWORDS", L"keywords"}, "KOVAMDKeywords"},
+    {{L"COPYRIGHT", L"copyright"}, "KOVAMDCopyright"},
+    {{L"PUBLISHER", L"publisher"}, "KOVAMDPublishers"},
+    {{L"LOCATION", L"location"}, "KOVAMDNamedLocation"},
+};
+constexpr Row kFreeNumbers[] = {
+    {MediaInfoLib::Stream_General, L"DATE", "KOVAMDRecordingYear", Kind::kYear},
+    {MediaInfoLib::Stream_General, L"date", "KOVAMDRecordingYear", Kind::kYear},
+    {MediaInfoLib::Stream_General, L"track", "KOVAMDAudioTrackNumber", Kind::kInteger},
+    {MediaInfoLib::Stream_General, L"Part/Position", "KOVAMDAudioTrackNumber", Kind::kInteger},
 };
 
 std::string Utf8(const std::wstring& text) {
@@ -88,6 +135,15 @@ void SetRow(const Row& row, std::string value, Findings& findings) {
   if (parsed.ptr == value.data() || number <= 0 || number > 9e15) return;
   if (row.kind == Kind::kMilliseconds) return findings.SetNumber(row.field, number / 1000);
   if (row.kind == Kind::kInteger || number <= 9999) findings.SetInteger(row.field, static_cast<int64_t>(number));
+}
+
+void AddFreeTags(MediaInfo& info, Findings& findings) {
+  for (const auto& tag : kFreeTags) {
+    for (const wchar_t* name : tag.names) {
+      findings.Append(tag.field, Value(info, MediaInfoLib::Stream_General, 0, name));
+    }
+  }
+  for (const Row& row : kFreeNumbers) SetRow(row, Value(info, row.stream, 0, row.name), findings);
 }
 
 void AddStreams(MediaInfo& info, Findings& findings) {
@@ -137,6 +193,7 @@ void ReadStreams(const Source& source, Findings& findings) {
   Feed(info, source);
   if (Value(info, MediaInfoLib::Stream_General, 0, L"Format").empty()) return findings.Fail("damaged");
   for (const Row& row : kRows) SetRow(row, Value(info, row.stream, 0, row.name), findings);
+  AddFreeTags(info, findings);
   AddStreams(info, findings);
 }
 

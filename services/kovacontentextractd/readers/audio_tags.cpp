@@ -1,0 +1,82 @@
+#include "services/kovacontentextractd/readers/audio_tags.h"
+
+#include <charconv>
+#include <string>
+
+#include "services/kovacontentextractd/readers/latin1.h"
+#include "services/kovacontentextractd/readers/times.h"
+
+namespace ferrox::extract {
+
+namespace {
+
+struct TagField {
+  const char* tag;
+  const char* field;
+};
+
+constexpr TagField kTextTags[] = {
+    {"TITLE", "KOVAMDTitle"},
+    {"ALBUM", "KOVAMDAlbum"},
+    {"ARTIST", "KOVAMDAuthors"},
+    {"ALBUMARTIST", "KOVAMDAuthors"},
+    {"PERFORMER", "KOVAMDContributors"},
+    {"CONDUCTOR", "KOVAMDContributors"},
+    {"COMPOSER", "KOVAMDComposer"},
+    {"LYRICIST", "KOVAMDLyricist"},
+    {"GENRE", "KOVAMDMusicalGenre"},
+    {"COMMENT", "KOVAMDComment"},
+    {"DESCRIPTION", "KOVAMDDescription"},
+    {"COPYRIGHT", "KOVAMDCopyright"},
+    {"LABEL", "KOVAMDPublishers"},
+    {"LANGUAGE", "KOVAMDLanguages"},
+    {"INITIALKEY", "KOVAMDKeySignature"},
+    {"BPM", "KOVAMDTempo"},
+    {"ENCODING", "KOVAMDAudioEncodingApplication"},
+    {"ENCODEDBY", "KOVAMDEncodingApplications"},
+};
+
+int64_t LeadingNumber(const std::string& text) {
+  int64_t number = 0;
+  (void)std::from_chars(text.data(), text.data() + text.size(), number);
+  return number;
+}
+
+/// The encoding of the texts that are no Latin-1 although their tag says so; empty when they may be.
+std::string EncodingOf(const TagLib::PropertyMap& tags) {
+  std::string texts;
+  for (const TagField& row : kTextTags) {
+    const auto found = tags.find(row.tag);
+    if (found == tags.end()) continue;
+    for (const TagLib::String& value : found->second) {
+      if (value.isLatin1() && !value.isAscii() && texts.size() < 4096) texts += value.to8Bit(true) + "\n";
+    }
+  }
+  return TrueEncoding(texts);
+}
+
+}  // namespace
+
+void AddTags(const TagLib::PropertyMap& tags, Findings& findings) {
+  const std::string encoding = EncodingOf(tags);
+  for (const TagField& row : kTextTags) {
+    const auto found = tags.find(row.tag);
+    if (found == tags.end()) continue;
+    for (const TagLib::String& value : found->second) {
+      const std::string text = WithoutDoubleEncoding(value.to8Bit(true));
+      findings.Append(row.field, encoding.empty() ? text : InTrueEncoding(text, encoding));
+    }
+  }
+  const auto first = [&](const char* tag) {
+    const auto found = tags.find(tag);
+    return found != tags.end() && !found->second.isEmpty() ? found->second.front().to8Bit(true) : std::string();
+  };
+  const int64_t track = LeadingNumber(first("TRACKNUMBER")), year = LeadingNumber(first("DATE"));
+  if (track > 0) findings.SetInteger("KOVAMDAudioTrackNumber", track);
+  if (year > 0 && year <= 9999) findings.SetInteger("KOVAMDRecordingYear", year);
+  if (const auto time = ParseTime(first("DATE"))) findings.SetInteger("KOVAMDContentCreationDate", *time);
+  const auto words = tags.find("LYRICS");
+  if (words != tags.end()) (void)findings.AddText(words->second.toString("\n").to8Bit(true));
+}
+
+}  // namespace ferrox::extract

@@ -1,0 +1,214 @@
+"""Pictures: what cameras, and then people, put into them.
+
+Of files as cameras and programs made them, exiftool says what must be found; to others it adds texts in several languages.
+"""
+
+import struct
+import tempfile
+
+import tools
+
+GO_IMAGE, GO_EXIF = "golang-golang-x-image-dev", "golang-github-rwcarlsen-goexif-dev"
+MIMETYPE = "golang-github-gabriel-vasile-mimetype-dev"
+DONORS = [GO_IMAGE, GO_EXIF, MIMETYPE]
+SAMPLES = {GO_IMAGE: "usr/share/gocode/src/golang.org/x/image/testdata",
+           GO_EXIF: "usr/share/gocode/src/github.com/rwcarlsen/goexif/exif",
+           MIMETYPE: "usr/share/gocode/src/github.com/gabriel-vasile/mimetype/testdata"}
+
+RAW = "image/x-raw"
+TYPES = {"jpg": "image/jpeg", "tif": "image/tiff", "png": "image/png", "webp": "image/webp", "heic": "image/heic",
+         "avif": "image/avif", "psd": "image/vnd.adobe.photoshop", "gif": "image/gif", "bmp": "image/bmp",
+         "jp2": "image/jp2"}
+
+# Cameras by their makers' samples; each line is a format.
+CAMERAS = """
+Apple.jpg Canon.jpg Canon1DmkIII.jpg Casio.jpg Casio2.jpg FujiFilm.jpg GE.jpg GoPro.jpg JVC.jpg Minolta.jpg Motorola.jpg
+Nikon.jpg NikonD2Hs.jpg NikonD70.jpg Olympus.jpg Olympus2.jpg OlympusE1.jpg Panasonic.jpg Ricoh.jpg Ricoh2.jpg Sanyo.jpg
+Sigma.jpg Sony.jpg GPS.jpg
+CanonRaw.cr2 CanonRaw.cr3 CanonRaw.crw DNG.dng FujiFilm.raf Minolta.mrw Nikon.nef Panasonic.rw2 PhaseOne.iiq
+ExifTool.tif GeoTiff.tif PNG.png RIFF.webp QuickTime.heic Photoshop.psd GIF.gif BMP.bmp Jpeg2000.jp2
+""".split()
+# Cut off behind what the camera wrote: all of that is found, and that something is missing is said.
+CUT = {"CanonRaw.cr3": "damaged"}
+
+PLAIN = [
+    (GO_IMAGE, "go-turns-two-280x360.jpeg", "jpg"), (GO_IMAGE, "blue-purple-pink.lzwcompressed.tiff", "tif"),
+    (GO_IMAGE, "bw-gopher_ccittGroup4.tiff", "tif"), (GO_IMAGE, "video-001-tile-64x64.tiff", "tif"),
+    (GO_IMAGE, "go-turns-two-rotate-nn.png", "png"), (GO_IMAGE, "gopher-doc.4bpp.png", "png"),
+    (GO_IMAGE, "blue-purple-pink.lossy.webp", "webp"), (GO_IMAGE, "gopher-doc.8bpp.lossless.webp", "webp"),
+    (GO_IMAGE, "colormap.bmp", "bmp"), (GO_IMAGE, "video-001.bmp", "bmp"), (GO_EXIF, "sample1.jpg", "jpg"),
+    (GO_EXIF, "samples/has-lens-info.jpg", "jpg"), (GO_EXIF, "samples/f6-exif.jpg", "jpg"),
+    (MIMETYPE, "avif.avif", "avif"), (MIMETYPE, "psd.psd", "psd"), (MIMETYPE, "apng.png", "png"),
+]
+
+# Of a language: title, description, keywords, author, city, country, people.
+TEXTS = {
+    "russian": ("Закат над Волгой", "Вид с набережной", ["река", "вечер"], "Иван Шишкин", "Казань", "Россия", "Мария"),
+    "japanese": ("桜の公園", "春の散歩道", ["花見", "公園"], "山田太郎", "京都", "日本", "花子"),
+    "greek": ("Ηλιοβασίλεμα", "Το λιμάνι το βράδυ", ["θάλασσα", "λιμάνι"], "Ελένη Παππά", "Χανιά", "Ελλάδα", "Νίκος"),
+}
+BASES = {
+    "jpg": (GO_IMAGE, "go-turns-two-280x360.jpeg"), "tif": (GO_IMAGE, "video-001.tiff"),
+    "png": (GO_IMAGE, "go-turns-two-down-nn.png"), "avif": (MIMETYPE, "avif.avif"), "psd": (MIMETYPE, "psd.psd"), "heic": None, "dng": None, "nef": None, "gif": None,
+    "jp2": None,
+}
+
+
+def donor(corpus, package, name):
+    return corpus.donor(package, f"{SAMPLES[package]}/{name}")
+
+
+def fields_of(said, extension):
+    """The fields that must be found, of what exiftool says. Sizes of raw files are told in many ways."""
+    fields = {}
+    for tag, field in (("Make", "AcquisitionMake"), ("Model", "AcquisitionModel")):
+        if str(said.get(tag, "")).strip():
+            fields["KOVAMD" + field] = str(said[tag]).strip()
+    for tag, field in (("FNumber", "FNumber"), ("ExposureTime", "ExposureTimeSeconds"), ("FocalLength", "FocalLength")):
+        if isinstance(said.get(tag), (int, float)) and said[tag] > 0 and extension != "crw":
+            fields["KOVAMD" + field] = tools.near(said[tag])
+    if isinstance(said.get("ISO"), int) and said["ISO"] > 10 and extension != "crw":
+        fields["KOVAMDISOSpeed"] = said["ISO"]
+    if isinstance(said.get("Orientation"), int):
+        fields["KOVAMDOrientation"] = said["Orientation"]
+    taken = tools.seconds_of(said.get("DateTimeOriginal", ""), said.get("OffsetTimeOriginal", ""))
+    if taken is not None:
+        fields["KOVAMDContentCreationDate"] = taken
+    if extension in TYPES:
+        fields["KOVAMDPixelWidth"], fields["KOVAMDPixelHeight"] = said["ImageWidth"], said["ImageHeight"]
+    return fields
+
+
+def add_as_they_are(corpus):
+    rows = [(tools.sample(corpus, name), name.rsplit(".", 1)[1], CUT.get(name)) for name in CAMERAS]
+    rows += [(donor(corpus, package, name), extension, None) for package, name, extension in PLAIN]
+    rows.append((corpus.source_donor("libheif", "examples/example.heic"), "heic", None))
+    rows.append((corpus.source_donor("libheif", "examples/example.avif"), "avif", None))
+    said = tools.examine(corpus, [path for path, _, _ in rows])
+    for number, (path, extension, error) in enumerate(rows):
+        corpus.add(f"{extension}/as_made_{number}.{extension}", path, fields=fields_of(said[path], extension),
+                   mime=TYPES.get(extension, RAW), error=error)
+
+
+def tags_of(texts):
+    title, description, keywords, author, city, country, person = texts
+    return [f"-XMP-dc:Title={title}", f"-XMP-dc:Description={description}", f"-XMP-dc:Creator={author}",
+            *[f"-XMP-dc:Subject={word}" for word in keywords], f"-XMP-photoshop:City={city}",
+            f"-XMP-photoshop:Country={country}", f"-XMP-iptcExt:PersonInImage={person}",
+            "-EXIF:Make=Kamerawerk", "-EXIF:Model=K 100", "-EXIF:DateTimeOriginal=2023:07:14 18:30:00",
+            "-EXIF:OffsetTimeOriginal=+02:00"]
+
+
+def base(corpus, extension):
+    if BASES[extension] is not None:
+        return donor(corpus, *BASES[extension])
+    if extension == "heic":
+        return corpus.source_donor("libheif", "examples/example.heic")
+    return tools.sample(corpus, {"dng": "DNG.dng", "nef": "Nikon.nef", "gif": "GIF.gif", "jp2": "Jpeg2000.jp2"}[extension])
+
+
+def webp(picture, width, height, xmp):
+    """The picture with XMP, in the extended form that it then needs."""
+    def chunk(name, data):
+        return name + struct.pack("<I", len(data)) + data + b"\0" * (len(data) % 2)
+    size = (width - 1).to_bytes(3, "little") + (height - 1).to_bytes(3, "little")
+    chunks = b"WEBP" + chunk(b"VP8X", b"\4\0\0\0" + size) + picture[12:] + chunk(b"XMP ", xmp)
+    return b"RIFF" + struct.pack("<I", len(chunks)) + chunks
+
+
+def add_webp_with_texts(corpus):
+    """Its XMP is made beside it, since exiftool does not write this format."""
+    path = donor(corpus, GO_IMAGE, "blue-purple-pink.lossless.webp")
+    said = tools.examine(corpus, [path])[path]
+    with open(path, "rb") as file:
+        picture = file.read()
+    with tempfile.TemporaryDirectory() as work:
+        for language, texts in TEXTS.items():
+            tags = [tag for tag in tags_of(texts) if tag.startswith("-XMP")]
+            tools.exiftool(corpus, [*tags, "-XMP-tiff:Model=K 200", "-o", f"{work}/{language}.xmp"])
+            with open(f"{work}/{language}.xmp", "rb") as file:
+                packet = file.read()
+            corpus.add(f"webp/{language}.webp", webp(picture, said["ImageWidth"], said["ImageHeight"], packet), texts[2],
+                       {"KOVAMDTitle": texts[0], "KOVAMDCity": texts[4], "KOVAMDAcquisitionModel": "K 200",
+                        "KOVAMDPixelWidth": said["ImageWidth"], "KOVAMDPixelHeight": said["ImageHeight"]})
+
+
+def add_with_texts(corpus):
+    with tempfile.TemporaryDirectory() as work:
+        jobs = [(base(corpus, extension), f"{work}/{language}.{extension}", tags_of(texts))
+                for extension in BASES for language, texts in TEXTS.items()]
+        tools.write_tags(corpus, jobs)
+        for extension in BASES:
+            for language, (title, description, keywords, author, city, country, person) in TEXTS.items():
+                fields = {"KOVAMDTitle": title, "KOVAMDDescription": description, "KOVAMDCity": city,
+                          "KOVAMDCountry": country, "KOVAMDPeopleDisplayName": person}
+                if extension not in ("gif", "nef"):  # no EXIF in the one; the other keeps what it has of the camera
+                    fields.update({"KOVAMDAcquisitionMake": "Kamerawerk", "KOVAMDAcquisitionModel": "K 100",
+                                   "KOVAMDContentCreationDate": 1689352200})
+                corpus.add(f"{extension}/{language}.{extension}", f"{work}/{language}.{extension}",
+                           [*keywords, author.split()[0]], fields)
+
+
+def add_older_texts(corpus):
+    """Texts outside of XMP: IPTC, with and without a mark for UTF-8, comments, Windows' own, names in raw code pages."""
+    jpeg = base(corpus, "jpg")
+    with tempfile.TemporaryDirectory() as work:
+        def written(name, *tags):
+            tools.write_tags(corpus, [(jpeg, f"{work}/{name}", list(tags))])
+            return f"{work}/{name}"
+        corpus.add("jpg/iptc.jpg", written("iptc.jpg", "-IPTC:ObjectName=Mořské pobřeží", "-IPTC:City=Plzeň",
+                                           "-IPTC:Keywords=léto", "-IPTC:Caption-Abstract=Dovolená u moře",
+                                           "-IPTC:Country-PrimaryLocationName=Česko", "-IPTC:Sub-location=Doudlevce"),
+                   ["léto", "moře"], {"KOVAMDTitle": "Mořské pobřeží", "KOVAMDNamedLocation": "Doudlevce, Plzeň, Česko"})
+        corpus.add("jpg/windows.jpg", written("windows.jpg", "-EXIF:XPTitle=Ausflug zum Königssee",
+                                              "-EXIF:XPKeywords=Gebirge;Schiff", "-EXIF:XPComment=schönes Wetter"),
+                   ["Gebirge", "Schiff"], {"KOVAMDTitle": "Ausflug zum Königssee", "KOVAMDComment": "schönes Wetter"})
+        corpus.add("jpg/comment.jpg", written("comment.jpg", "-Comment=prise du vieux phare"), ["phare"])
+        corpus.add("jpg/user_comment.jpg", written("user_comment.jpg", "-EXIF:UserComment=宿の窓から"), ["窓"],
+                   {"KOVAMDComment": "宿の窓から"})
+        plain = written("plain.jpg", "-EXIF:ImageDescription=" + "x" * 26, "-EXIF:Artist=Somebody")
+        with open(plain, "rb") as file:
+            old = file.read().replace(b"x" * 26, "Прогулка по берегу Финского".encode("cp1251")[:26])
+        corpus.add("jpg/old_russian.jpg", old, ["берегу"])
+    for language, code_page in (("russian", "utf-8"), ("greek", "utf-8")):
+        comment = TEXTS[language][1].encode(code_page)
+        corpus.add(f"gif/film_{language}.gif", gif(48, 32, comment), TEXTS[language][1].split()[-1:],
+                   {"KOVAMDPixelWidth": 48, "KOVAMDPixelHeight": 32, "KOVAMDComment": TEXTS[language][1]})
+
+
+def gif(width, height, comment, pictures=3):
+    """A film of one colour a picture: the codes are as wide as at the beginning, since each 4th one begins anew."""
+    def pieces(data):
+        return b"".join(bytes([len(data[i:i + 255])]) + data[i:i + 255] for i in range(0, len(data), 255)) + b"\0"
+    bits, count = 0, 0
+    for i in range(width * height):
+        for code in ([4] if i % 2 == 0 else []) + [i % 2]:
+            bits |= code << count
+            count += 3
+    bits |= 5 << count
+    picture = b"," + struct.pack("<HHHHB", 0, 0, width, height, 0) + b"\2" + pieces(bits.to_bytes(count // 8 + 1, "little"))
+    head = b"GIF89a" + struct.pack("<HHBBB", width, height, 0x91, 0, 0) + bytes(range(12))
+    return head + (b"!\xf9\4\0\x0a\0\0\0" + picture) * pictures + b"!\xfe" + pieces(comment) + b";"
+
+
+def add_drawings(corpus):
+    """What is text in truth."""
+    drawing = """<?xml version="1.0" encoding="UTF-8"?>
+<svg xmlns="http://www.w3.org/2000/svg" width="200" height="50"><title>План этажа</title>
+<desc>Лестница слева</desc><text x="1" y="9">Переговорная</text><text x="1" y="30">кухня</text></svg>
+"""
+    corpus.add("svg/floor.svg", drawing.encode(), ["Переговорная", "кухня", "Лестница"], {"KOVAMDTitle": "План этажа"},
+               mime="image/svg+xml")
+    corpus.add("svg/report.svg", tools.sample(corpus, "XMP.svg"), ["widget", "growth"], mime="image/svg+xml")
+    corpus.add("svg/badge.svg", b'<svg xmlns="http://www.w3.org/2000/svg"><text>coverage <tspan>gedeckt</tspan></text></svg>',
+               ["gedeckt"], mime="image/svg+xml")
+    corpus.add("xmp/beside_a_picture.xmp", tools.sample(corpus, "XMP6.xmp"), ["title"], mime="application/rdf+xml")
+    corpus.add("xmp/canon.xmp", tools.sample(corpus, "XMP.xmp"), ["test1"], mime="application/rdf+xml")
+
+
+def make(corpus):
+    add_as_they_are(corpus)
+    add_with_texts(corpus)
+    add_webp_with_texts(corpus)
+    add_older_texts(corpus)
+    add_drawings(corpus)
