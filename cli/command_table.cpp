@@ -51,8 +51,8 @@ CommandGroup Searching() {
                 {"--fresh", "[=SECONDS]",
                  "wait until all that was changed before can be found (default 30); exit code 4 when that is not sure"},
                 kJson},
-               "Finds files. All words must match; \"a phrase\", prefix*, OR, NOT, ( ), kind:, ext:, path:, size: and "
-               "date: work.",
+               "Finds files. All words must match; \"a phrase\", prefix*, OR, NOT and ( ) work, and conditions such as "
+               "kind:image, size:>10M, author:, artist:, duration:>10m, camera:, taken:2023; the manual lists all.",
                &RunSearch},
               {"suggest-refresh",
                "[SHARE...]",

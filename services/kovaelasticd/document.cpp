@@ -1,6 +1,9 @@
 #include "services/kovaelasticd/document.h"
 
 #include <algorithm>
+#include <cinttypes>
+#include <cstdio>
+#include <cstdlib>
 #include <cstring>
 
 #include "common/file_util.h"
@@ -11,6 +14,9 @@
 namespace ferrox::engine {
 
 namespace {
+
+/// Larger numbers are in no range.
+constexpr double kRangedMax = 1e15;
 
 /// A field whose value follows from a column: its name and how it follows.
 struct DerivedField {
@@ -163,7 +169,34 @@ void AppendFieldWords(std::string& out, const std::string& name, const Json::Val
   }
 }
 
+/// Readers tell some numbers as texts.
+std::optional<int64_t> WholeNumber(const Json::Value& value) {
+  double number = -1;
+  if (value.isNumeric()) {
+    number = value.asDouble();
+  } else if (value.isString()) {
+    const std::string text = value.asString();
+    char* end = nullptr;
+    number = strtod(text.c_str(), &end);
+    if (end == text.c_str() || *end != '\0') return std::nullopt;
+  }
+  if (!(number >= 0 && number < kRangedMax)) return std::nullopt;
+  return static_cast<int64_t>(number + 0.5);
+}
+
+void AppendRangeWord(std::string& out, const std::string& name, const Json::Value& value) {
+  const std::optional<int64_t> number = WholeNumber(value);
+  if (number.has_value()) out += RangeWord(name, *number) + kReadyEnd;
+}
+
 }  // namespace
+
+std::string RangeWord(const std::string& field_name, int64_t number) {
+  const auto limited = std::clamp<int64_t>(number, 0, static_cast<int64_t>(kRangedMax));
+  char digits[32];
+  (void)snprintf(digits, sizeof(digits), "#%016" PRId64, limited);
+  return field_name + kFieldEnd + digits;
+}
 
 void FieldNames::Add(int64_t number, const std::string& name) {
   if (static_cast<size_t>(number) > names_.size()) names_.resize(static_cast<size_t>(number));
@@ -243,6 +276,7 @@ MetaText MakeMetaText(const DocRow& row, const Json::Value& document, const Sche
       AppendTexts(meta.text, *member);
     }
     if (Schema::IsSearchable(name)) AppendFieldWords(meta.fields, name, *member);
+    if (Schema::IsRanged(name)) AppendRangeWord(meta.fields, name, *member);
   }
   return meta;
 }

@@ -62,6 +62,8 @@ inline constexpr char kReadyMark = '\x03';
 inline constexpr char kReadyEnd = '\x1E';
 /// Stands between a field's name and the word, in a word marked with its field.
 inline constexpr char kFieldEnd = '\x1F';
+/// The word by which a number in a field is found; words of one field have the order of their numbers.
+std::string RangeWord(const std::string& field_name, int64_t number);
 
 /// The row of a document. `names` must know every member (see NamesNeeded).
 DocRow PackDocument(const std::string& path, const Json::Value& document, const FieldNames& names);

@@ -24,6 +24,7 @@ struct QueryNode {
     kPath,   ///< lies in the folder `text`, or is it
     kSize,   ///< the size lies in `low` .. `high`
     kDate,   ///< the date of change lies in `low` .. `high`
+    kRange,  ///< a number in one of `fields` lies in `low` .. `high`
   };
 
   Type type = Type::kAll;

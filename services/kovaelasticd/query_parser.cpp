@@ -10,10 +10,6 @@ namespace ferrox::engine {
 
 namespace {
 
-constexpr char kKnownFields[] =
-    "name, content, title, author, artist, album, genre, year, keyword, tag, comment, description, camera, language, "
-    "owner, group, kind, ext, path, size, date and the full KOVAMD names";
-
 bool IsBlank(char c) { return c == ' ' || (c >= '\t' && c <= '\r'); }
 
 bool IsNameChar(char c) {
@@ -216,6 +212,7 @@ class Parser {
     if (lower == "path") return PathNode(value);
     if (lower == "size") return SizeNode(value);
     if (lower == "date") return DateNode(value);
+    if (const RangeField* field = FindRangeField(lower)) return NumberNode(*field, value);
     const bool is_name =
         lower == "name" || name == field::kFsName || name == field::kSearchName || name == field::kDisplayName;
     if (is_name) return NameNode(value);
@@ -226,7 +223,7 @@ class Parser {
     std::vector<std::string> fields = FriendlyFields(name);
     const bool full_name = name.compare(0, 4, "KOVA") == 0 || name.compare(0, 7, "_KOVAMD") == 0;
     if (fields.empty() && !full_name) {
-      Refuse(begin, "there is no field \"" + name + "\"; known are " + kKnownFields +
+      Refuse(begin, "there is no field \"" + name + "\"; known are " + KnownFields() +
                         "; to look for the text as it stands, put it in quotes");
     }
     if (fields.empty() && name != field::kTextContent && !Schema::IsSearchable(name)) {
@@ -332,6 +329,16 @@ class Parser {
     return RangeNode(QueryNode::Type::kDate, *range);
   }
 
+  QueryNode NumberNode(const RangeField& field, const Value& value) {
+    const std::optional<ValueRange> range = field.parse(value.text, now_);
+    if (!range.has_value()) {
+      Refuse(value.begin, "\"" + value.text + "\" does not fit; write " + field.example);
+    }
+    QueryNode node = RangeNode(QueryNode::Type::kRange, *range);
+    node.fields = field.fields;
+    return node;
+  }
+
   static QueryNode RangeNode(QueryNode::Type type, const ValueRange& range) {
     QueryNode node = Node(type);
     node.low = range.low;
@@ -402,7 +409,9 @@ void Print(std::string& out, const QueryNode& node) {
       break;
     case QueryNode::Type::kSize:
     case QueryNode::Type::kDate:
-      out += node.type == QueryNode::Type::kSize ? "size:" : "date:";
+    case QueryNode::Type::kRange:
+      out += node.type == QueryNode::Type::kSize ? "size" : node.type == QueryNode::Type::kDate ? "date" : "";
+      out += Join(node.fields) + ":";
       out += std::to_string(node.low) + ".." + std::to_string(node.high);
       break;
   }

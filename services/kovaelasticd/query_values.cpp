@@ -144,9 +144,20 @@ const FriendlyName kFriendlyNames[] = {
     {"title", {"KOVAMDTitle", "KOVAMDHeadline"}},
     {"author", {"KOVAMDAuthors", "KOVAMDCreator", "KOVAMDContributors", "KOVAMDComposer"}},
     {"artist", {"KOVAMDAuthors", "KOVAMDComposer", "KOVAMDParticipants"}},
+    {"composer", {"KOVAMDComposer"}},
     {"album", {"KOVAMDAlbum"}},
     {"genre", {"KOVAMDMusicalGenre"}},
-    {"year", {"KOVAMDRecordingYear"}},
+    {"subject", {"KOVAMDTitle", "KOVAMDHeadline"}},
+    {"from", {"KOVAMDAuthors", "KOVAMDAuthorAddresses"}},
+    {"to", {"KOVAMDRecipients", "KOVAMDRecipientAddresses"}},
+    {"person", {"KOVAMDPeopleDisplayName", "KOVAMDParticipants"}},
+    {"place", {"KOVAMDNamedLocation", "KOVAMDCity", "KOVAStateOrProvince", "KOVAMDCountry"}},
+    {"publisher", {"KOVAMDPublishers", "KOVAMDOrganizations"}},
+    {"copyright", {"KOVAMDCopyright", "KOVAMDRights"}},
+    {"program", {"KOVAMDEncodingApplications", "KOVAMDAudioEncodingApplication", "KOVAMDCreator"}},
+    {"codec", {"KOVAMDCodecs"}},
+    {"rating", {"KOVAMDStarRating"}},
+    {"type", {"KOVAMDContentType"}},
     {"keyword", {"KOVAMDKeywords", "_KOVAMDUserTags"}},
     {"tag", {"KOVAMDKeywords", "_KOVAMDUserTags"}},
     {"comment", {"KOVAMDComment", "KOVAMDFinderComment"}},
@@ -159,7 +170,75 @@ const FriendlyName kFriendlyNames[] = {
     {"text", {field::kTextContent}},
 };
 
+std::optional<ValueRange> ParseNumber(std::string_view text) {
+  const std::optional<int64_t> number = TakeNumber(text, 15);
+  return number.has_value() && text.empty() ? std::optional(ValueRange{*number, *number}) : std::nullopt;
+}
+
+/// "90", "5m", "1h30m", "3:25", "1:02:03": seconds, up to the end of the last unit that is told.
+std::optional<ValueRange> ParseDuration(std::string_view text) {
+  const bool clock = text.find(':') != std::string_view::npos;
+  if (text.empty() || text.back() == ':') return std::nullopt;
+  int64_t seconds = 0;
+  int64_t last_unit = 1;
+  while (!text.empty()) {
+    const std::optional<int64_t> number = TakeNumber(text, 6);
+    if (!number.has_value()) return std::nullopt;
+    const char unit = text.empty() ? (clock ? ':' : 's') : text.front();
+    if (!text.empty()) text.remove_prefix(1);
+    if (clock ? unit != ':' : unit != 's' && unit != 'm' && unit != 'h') return std::nullopt;
+    last_unit = unit == 'h' ? 3600 : unit == 'm' ? 60 : 1;
+    seconds = clock ? seconds * 60 + *number : seconds + *number * last_unit;
+  }
+  return ValueRange{seconds, seconds + last_unit - 1};
+}
+
+std::optional<ValueRange> ParseExactDuration(std::string_view text) {
+  const std::optional<ValueRange> range = ParseDuration(text);
+  return range.has_value() ? std::optional(ValueRange{range->low, range->low}) : std::nullopt;
+}
+
+std::optional<ValueRange> ParseNumberRange(std::string_view text, int64_t /*now*/) {
+  return ParseRange(text, &ParseNumber);
+}
+
+/// "5m" alone is all from 5 to 6 minutes, ">5m" and "5m..7m" begin with the first second of it.
+std::optional<ValueRange> ParseDurationRange(std::string_view text, int64_t /*now*/) {
+  const std::optional<ValueRange> alone = ParseDuration(text);
+  return alone.has_value() ? alone : ParseRange(text, &ParseExactDuration);
+}
+
+const RangeField kRangeFields[] = {
+    {"duration", {"KOVAMDDurationSecond"}, &ParseDurationRange, "duration:>10m, duration:3m..4m30s or duration:3:25"},
+    {"year", {"KOVAMDRecordingYear"}, &ParseNumberRange, "year:1969 or year:1960..1969"},
+    {"taken",
+     {"KOVAMDContentCreationDate"},
+     &ParseDateRange,
+     "taken:2024, taken:2024-01..2024-06 or taken:>2024-01-31"},
+    {"created", {"KOVAMDContentCreationDate"}, &ParseDateRange, "created:2024 or created:2024-01..2024-06"},
+    {"pages", {"KOVAMDNumberOfPages"}, &ParseNumberRange, "pages:>100 or pages:2..10"},
+    {"width", {"KOVAMDPixelWidth"}, &ParseNumberRange, "width:>=4000 or width:640..1024"},
+    {"height", {"KOVAMDPixelHeight"}, &ParseNumberRange, "height:>=3000 or height:480..768"},
+    {"iso", {"KOVAMDISOSpeed"}, &ParseNumberRange, "iso:>=1600 or iso:100..400"},
+    {"track", {"KOVAMDAudioTrackNumber"}, &ParseNumberRange, "track:1 or track:1..3"},
+};
+
 }  // namespace
+
+const RangeField* FindRangeField(std::string_view name) {
+  const std::string lower = Lower(name);
+  for (const RangeField& known : kRangeFields) {
+    if (lower == known.name) return &known;
+  }
+  return nullptr;
+}
+
+std::string KnownFields() {
+  std::string known = "name, kind, ext, path, size, date";
+  for (const FriendlyName& field : kFriendlyNames) known += std::string(", ") + field.name;
+  for (const RangeField& field : kRangeFields) known += std::string(", ") + field.name;
+  return known + " and the full KOVAMD names";
+}
 
 std::optional<ValueRange> ParseSizeRange(std::string_view text) { return ParseRange(text, &ParseSize); }
 

@@ -20,11 +20,24 @@ std::optional<ValueRange> ParseSizeRange(std::string_view text);
 /// "2024", "2024-01..2024-06", ">2024-01-01", "7d", "today": seconds since the epoch, by local time.
 std::optional<ValueRange> ParseDateRange(std::string_view text, int64_t now);
 
+/// Fields that hold a number, and how a range of them is written.
+struct RangeField {
+  const char* name;  ///< "pages"
+  std::vector<std::string> fields;
+  std::optional<ValueRange> (*parse)(std::string_view text, int64_t now);
+  const char* example;
+};
+/// Null when the name stands for none.
+const RangeField* FindRangeField(std::string_view name);
+
 /// The kinds that a name stands for; nothing when it is no kind.
 std::optional<int32_t> ParseKind(std::string_view text);
 
 /// The document fields that a friendly name stands for; empty when it is none.
 std::vector<std::string> FriendlyFields(std::string_view name);
+
+/// All names that can stand before a ":", for people.
+std::string KnownFields();
 
 /// The number of a user or group of this host; nothing when there is none of that name.
 std::optional<int64_t> UserNumberOf(const std::string& name);

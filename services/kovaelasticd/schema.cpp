@@ -35,6 +35,10 @@ constexpr const char* kNotSearchable[] = {field::kPath,
                                           "KOVAMDPhysicalSize",
                                           "KOVAMDPrivilege"};
 
+constexpr const char* kRanged[] = {"KOVAMDDurationSecond", "KOVAMDRecordingYear",   "KOVAMDContentCreationDate",
+                                   "KOVAMDNumberOfPages",  "KOVAMDPixelWidth",      "KOVAMDPixelHeight",
+                                   "KOVAMDISOSpeed",       "KOVAMDAudioTrackNumber"};
+
 template <size_t Count>
 bool IsOneOf(const char* const (&names)[Count], const std::string& name) {
   return std::find(std::begin(names), std::end(names), name) != std::end(names);
@@ -106,5 +110,7 @@ bool Schema::IsPlain(const std::string& name) const {
 }
 
 bool Schema::IsSearchable(const std::string& name) { return !IsInternal(name) && !IsOneOf(kNotSearchable, name); }
+
+bool Schema::IsRanged(const std::string& name) { return IsOneOf(kRanged, name); }
 
 }  // namespace ferrox::engine

@@ -40,6 +40,8 @@ class Schema {
   bool IsPlain(const std::string& name) const;
   /// Whether "field:value" looks into the field.
   static bool IsSearchable(const std::string& name);
+  /// Whether the field holds a number that ranges are asked for.
+  static bool IsRanged(const std::string& name);
 
   const Json::Value& Mappings() const { return mappings_; }
 

@@ -25,7 +25,7 @@ bool IsWords(QueryNode::Type type) {
 
 bool IsFilter(QueryNode::Type type) {
   return type == QueryNode::Type::kExt || type == QueryNode::Type::kKind || type == QueryNode::Type::kPath ||
-         type == QueryNode::Type::kSize || type == QueryNode::Type::kDate;
+         type == QueryNode::Type::kSize || type == QueryNode::Type::kDate || type == QueryNode::Type::kRange;
 }
 
 int32_t KindOfExtension(const std::string& ext) {
@@ -152,6 +152,13 @@ DocSet Searcher::EvaluateFilter(const QueryNode& node) {
     collect(statement.Bind(1, std::string_view(begin)).Bind(2, std::string_view(end)));
     Statement itself = database.Prepare("SELECT id FROM docs WHERE path = ?1");
     collect(itself.Bind(1, std::string_view(node.text)));
+  } else if (node.type == QueryNode::Type::kRange) {
+    Statement statement = database.Prepare("SELECT doc FROM temp.meta_terms WHERE term >= ?1 AND term <= ?2");
+    for (const std::string& name : node.fields) {
+      const std::string low = RangeWord(name, node.low);
+      const std::string high = RangeWord(name, node.high);
+      collect(statement.Bind(1, std::string_view(low)).Bind(2, std::string_view(high)));
+    }
   } else {
     Statement statement =
         database.Prepare(node.type == QueryNode::Type::kSize ? "SELECT id FROM docs WHERE size BETWEEN ?1 AND ?2"
@@ -163,7 +170,7 @@ DocSet Searcher::EvaluateFilter(const QueryNode& node) {
 
 /// Keeps the documents for which the condition holds, or does not: by looking at each when they are few.
 void Searcher::ApplyFilter(DocSet& documents, const QueryNode& filter, bool wanted) {
-  if (documents.Count() > kCheckOneByOneMax) {
+  if (documents.Count() > kCheckOneByOneMax || filter.type == QueryNode::Type::kRange) {
     const DocSet matching = EvaluateFilter(filter);
     wanted ? documents.IntersectWith(matching) : documents.Subtract(matching);
     return;

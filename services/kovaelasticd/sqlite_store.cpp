@@ -14,7 +14,7 @@ namespace ferrox::engine {
 namespace {
 
 constexpr int64_t kApplicationId = 0x4B4F5641;
-constexpr int64_t kFormatVersion = 1;
+constexpr int64_t kFormatVersion = 2;
 constexpr size_t kIdleReadersMax = 4;
 constexpr int64_t kLogMaxBytes = 16 << 20;
 
@@ -57,8 +57,9 @@ IndexStore::~IndexStore() = default;
 
 StoreReader::StoreReader(const std::string& path) : database(path, Database::Mode::kRead) {
   database.Execute("PRAGMA cache_size = -8192");
-  database.Execute("PRAGMA query_only = 1");
   RegisterFullText(database);
+  database.Execute("CREATE VIRTUAL TABLE temp.meta_terms USING fts5vocab('main', 'meta_fts', 'instance')");
+  database.Execute("PRAGMA query_only = 1");
 }
 
 SqliteStore::SqliteStore(const std::string& path, bool create, std::shared_ptr<const Schema> schema)

@@ -252,6 +252,39 @@ TEST_F(IndexStoreTest, FewAndManyDocumentsAreFilteredAndOrderedExactly) {
   for (const auto& [query, total] : kRows) EXPECT_EQ(Find(*store_, query).total, total) << query;
 }
 
+TEST_F(IndexStoreTest, NumbersOfFieldsAreFoundByRange) {
+  const struct {
+    const char* path;
+    const char* field;
+    Json::Value value;
+  } kDocuments[] = {
+      {"/v/short.mp3", "KOVAMDDurationSecond", 59.4},       {"/v/song.mp3", "KOVAMDDurationSecond", 200},
+      {"/v/film.mkv", "KOVAMDDurationSecond", 7200.9},      {"/v/book.pdf", "KOVAMDNumberOfPages", "300"},
+      {"/v/letter.pdf", "KOVAMDNumberOfPages", "2"},        {"/v/odd.pdf", "KOVAMDNumberOfPages", "2 or 3"},
+      {"/v/a.jpg", "KOVAMDContentCreationDate", 981173106}, {"/v/b.jpg", "KOVAMDContentCreationDate", 1717977600},
+  };
+  for (const auto& row : kDocuments) {
+    Json::Value document = FileDocument(row.path, "word");
+    document[row.field] = row.value;
+    Put(document);
+  }
+  store_->Delete("/v/short.mp3");
+  store_->Commit();
+  const std::pair<const char*, const char*> kRows[] = {
+      {"duration:<10m", "/v/song.mp3"},
+      {"duration:>3m", "/v/film.mkv\n/v/song.mp3"},
+      {"duration:2h", "/v/film.mkv"},
+      {"pages:1..2", "/v/letter.pdf"},
+      {"word pages:>2", "/v/book.pdf"},
+      {"ext:pdf -pages:>2", "/v/letter.pdf\n/v/odd.pdf"},
+      {"taken:2001-02..2001-03", "/v/a.jpg"},
+      {"taken:>2001", "/v/b.jpg"},
+      {"pages:2 OR duration:2h", "/v/film.mkv\n/v/letter.pdf"},
+      {"iso:>0", ""},
+  };
+  for (const auto& [query, paths] : kRows) EXPECT_EQ(FindPaths(*store_, query), paths) << query;
+}
+
 TEST_F(IndexStoreTest, BetterHitsComeFirst) {
   Put("/v/mentions.txt", "a long text with many words and one lonely turbine in it " + std::string(4000, '.'));
   Put("/v/about.txt", "turbine turbine turbine and its blades");
