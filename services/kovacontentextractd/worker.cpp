@@ -160,6 +160,7 @@ bool ReceiveFork(int& socket, int& region) {
 
 int RunWorker(const Worker& worker, const char* empty_folder) try {
   KeepMemory();
+  (void)setenv("TZ", "UTC0", 1);  // else each time in an archive makes the C library look for the zone's file
   worker.prepare();
   for (int socket, region; ReceiveFork(socket, region);) {
     const pid_t pid = Fork();

@@ -5,32 +5,21 @@
 #include <cstdint>
 #include <cstring>
 
+#include "services/kovacontentextractd/readers/utf8_blocks.h"
+
 namespace ferrox::extract {
 
 namespace {
 
-constexpr uint64_t kHighBits = UINT64_C(0x8080808080808080);
-
-/// The high bits of the 8 bytes at `bytes`: those beyond ASCII have one.
-uint64_t HighBits(const unsigned char* bytes) {
-  uint64_t eight;
-  memcpy(&eight, bytes, sizeof(eight));
-  return eight & kHighBits;
-}
-
 /// How many bytes at the beginning are ASCII. Most text is, for long stretches.
 size_t AsciiPrefix(const unsigned char* bytes, size_t size) {
   size_t at = 0;
-  for (uint64_t high = 0; size - at >= sizeof(high); at += sizeof(high)) {
-    high = HighBits(bytes + at);
-    if (high != 0) {
-      const int bits = std::endian::native == std::endian::little ? std::countr_zero(high) : std::countl_zero(high);
-      return at + static_cast<size_t>(bits) / 8;
-    }
-    while (size - at >= 40 && (HighBits(bytes + at + 8) | HighBits(bytes + at + 16) | HighBits(bytes + at + 24) |
-                               HighBits(bytes + at + 32)) == 0) {
-      at += 32;
-    }
+  for (uint64_t eight; size - at >= sizeof(eight); at += sizeof(eight)) {
+    memcpy(&eight, bytes + at, sizeof(eight));
+    const uint64_t others = eight & UINT64_C(0x8080808080808080);
+    if (others == 0) continue;
+    const int bits = std::endian::native == std::endian::little ? std::countr_zero(others) : std::countl_zero(others);
+    return at + static_cast<size_t>(bits) / 8;
   }
   while (at < size && bytes[at] < 0x80) ++at;
   return at;
@@ -51,20 +40,26 @@ size_t CharacterLength(const unsigned char* p, size_t left) {
   return whole && first_bits >= 0xF090 && first_bits < 0xF490 ? 4 : 0;
 }
 
+/// How many bytes at the beginning are valid.
+size_t ValidBytes(const unsigned char* bytes, size_t size) {
+  size_t at = AsciiPrefix(bytes, size);
+  while (at < size) {
+    do {  // where one is beyond ASCII, others follow
+      const size_t length = CharacterLength(bytes + at, size - at);
+      if (length == 0) return at;
+      at += length;
+    } while (at < size && bytes[at] >= 0x80);
+    at += AsciiPrefix(bytes + at, size - at);
+  }
+  return at;
+}
+
 }  // namespace
 
 size_t ValidUtf8Prefix(std::string_view text) {
   const auto* bytes = reinterpret_cast<const unsigned char*>(text.data());
-  size_t at = AsciiPrefix(bytes, text.size());
-  while (at < text.size()) {
-    do {  // where one is beyond ASCII, others follow
-      const size_t length = CharacterLength(bytes + at, text.size() - at);
-      if (length == 0) return at;
-      at += length;
-    } while (at < text.size() && bytes[at] >= 0x80);
-    at += AsciiPrefix(bytes + at, text.size() - at);
-  }
-  return at;
+  const size_t checked = ValidUtf8Blocks(bytes, text.size());
+  return checked + ValidBytes(bytes + checked, text.size() - checked);
 }
 
 bool IsUtf8(std::string_view text, bool cut) {

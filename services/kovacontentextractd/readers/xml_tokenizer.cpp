@@ -20,6 +20,13 @@ bool IsBlank(char c) { return c == ' ' || c == '\t' || c == '\n' || c == '\r'; }
 
 bool EndsName(char c) { return IsBlank(c) || c == '>' || c == '/' || c == '=' || c == '<'; }
 
+/// Where the first of two characters is, the `near` one of which comes soon; the size of the text when neither is
+/// there.
+size_t FindEither(std::string_view text, char near, char other) {
+  const std::string_view before = text.substr(0, text.find(near));
+  return std::min(before.size(), before.find(other));
+}
+
 /// How many bytes at the end of `text` are a character of UTF-8 that is not complete.
 size_t CutOffBytes(std::string_view text) {
   for (size_t back = 1; back <= std::min<size_t>(3, text.size()); ++back) {
@@ -209,7 +216,7 @@ void XmlTokenizer::SkipElement() {
 
 XmlTokenizer::Token XmlTokenizer::ReadText() {
   const std::string_view rest = Rest();
-  const size_t size = std::min({rest.size(), rest.find('<'), rest.find('&')});
+  const size_t size = FindEither(rest, '<', '&');
   return TakeText(size == rest.size() ? size - CutOffBytes(rest) : size);
 }
 
@@ -356,7 +363,7 @@ void XmlTokenizer::ReadValue(char quote, std::string& value) {
       length = std::max<size_t>(Resolve(character), 1);
       if (value.size() < kValueMaxBytes) value += character;
     } else {
-      length = std::min({rest.size(), rest.find(quote), rest.find('&')});
+      length = FindEither(rest, quote, '&');
       value.append(rest.substr(0, std::min(length, kValueMaxBytes - std::min(kValueMaxBytes, value.size()))));
     }
     begin_ += length;
