@@ -2,18 +2,19 @@
 
 #include <algorithm>
 #include <exception>
-#include <iterator>
 #include <memory>
 #include <new>
 #include <poppler-document.h>
 #include <poppler-global.h>
 #include <poppler-page.h>
 #include <string>
+#include <string_view>
 
 #include "services/kovacontentextractd/readers/code_pages.h"
 #include "services/kovacontentextractd/readers/cpu_budget.h"
 #include "services/kovacontentextractd/readers/encoding.h"
 #include "services/kovacontentextractd/readers/mapped_file.h"
+#include "services/kovacontentextractd/readers/pdf/character_tables.h"
 #include "services/kovacontentextractd/readers/pdf/xmp_packet.h"
 #include "services/kovacontentextractd/readers/times.h"
 
@@ -93,33 +94,11 @@ void AddPages(const poppler::document& document, Findings& findings) {
   }
 }
 
-/// A page with one character in each of the four collections of East Asian characters, in the commonest encoding of
-/// each: as many as the library keeps tables of.
-std::string EastAsianPdf() {
-  static constexpr const char* kFonts[][2] = {
-      {"GB1", "GBK-EUC-H"}, {"CNS1", "ETen-B5-H"}, {"Japan1", "90ms-RKSJ-H"}, {"Korea1", "KSCms-UHC-H"}};
-  std::string fonts, content = "BT";
-  int count = 0;
-  for (const auto& [collection, encoding] : kFonts) {
-    const std::string name = "/F" + std::to_string(count++);
-    fonts += name + "<</Type/Font/Subtype/Type0/BaseFont/A/Encoding/" + encoding +
-             "/DescendantFonts[<</Type/Font/Subtype/CIDFontType0/BaseFont/A/CIDSystemInfo<</Registry(Adobe)/Ordering(" +
-             collection + ")/Supplement 0>>/FontDescriptor<</Type/FontDescriptor/FontName/A/Flags 4>>>>]>>";
-    content += name + " 9 Tf<B0A1>Tj";
-  }
-  content += " ET";
-  const std::string objects[] = {
-      "<</Type/Catalog/Pages 2 0 R>>", "<</Type/Pages/Kids[3 0 R]/Count 1>>",
-      "<</Type/Page/Parent 2 0 R/MediaBox[0 0 99 99]/Contents 4 0 R/Resources<</Font<<" + fonts + ">>>>>>",
-      "<</Length " + std::to_string(content.size()) + ">>stream\n" + content + "\nendstream"};
-  std::string pdf = "%PDF-1.4\n", table = "xref\n0 5\n0000000000 65535 f \n";
-  for (size_t i = 0; i < std::size(objects); ++i) {
-    const std::string offset = std::to_string(pdf.size());
-    table += std::string(10 - offset.size(), '0') + offset + " 00000 n \n";
-    pdf += std::to_string(i + 1) + " 0 obj" + objects[i] + "endobj\n";
-  }
-  return pdf + table + "trailer<</Root 1 0 R/Size 5>>startxref\n" + std::to_string(pdf.size()) + "\n%%EOF";
-}
+/// A document without anything.
+constexpr std::string_view kEmptyPdf =
+    "%PDF-1.4\n1 0 obj<</Type/Catalog/Pages 2 0 R>>endobj\n2 0 obj<</Type/Pages/Kids[]/Count 0>>endobj\n"
+    "xref\n0 3\n0000000000 65535 f \n0000000009 00000 n \n0000000052 00000 n \n"
+    "trailer<</Root 1 0 R/Size 3>>startxref\n96\n%%EOF";
 
 void ReadDocument(const char* bytes, size_t size, Findings& findings) {
   const Document document(poppler::document::load_from_raw_data(bytes, static_cast<int>(size)));
@@ -132,16 +111,14 @@ void ReadDocument(const char* bytes, size_t size, Findings& findings) {
 }  // namespace
 
 void PreparePdf() {
-  // What was loaded stays loaded as long as somebody holds it: the converters, and a document.
+  // The library keeps what it knows of the system as long as there is a document.
   static const Document* keeper = nullptr;
   if (keeper != nullptr) return;
   HoldConverter("UTF-8", "UTF-16");
   HoldConverter("UTF-16", "UTF-8");
-  static const std::string bytes = EastAsianPdf();
+  HoldCharacterTables();
   poppler::set_debug_error_function(&IgnoreComplaint, nullptr);
-  keeper = new Document(poppler::document::load_from_raw_data(bytes.data(), static_cast<int>(bytes.size())));
-  const std::unique_ptr<poppler::page> page(*keeper != nullptr ? (*keeper)->create_page(0) : nullptr);
-  if (page != nullptr) (void)page->text();
+  keeper = new Document(poppler::document::load_from_raw_data(kEmptyPdf.data(), static_cast<int>(kEmptyPdf.size())));
 }
 
 void ReadPdf(const Source& source, Findings& findings) {
