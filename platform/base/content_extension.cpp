@@ -397,6 +397,8 @@ constexpr ExtensionRow kExtensions[] = {
     {"me", "text/plain"},
     {"mef", "image/x-raw"},
     {"metainfo", "application/xml"},
+    {"mht", "multipart/related"},
+    {"mhtml", "multipart/related"},
     {"mid", "audio/midi"},
     {"midi", "audio/midi"},
     {"miff", "image/x-miff"},

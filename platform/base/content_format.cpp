@@ -37,6 +37,7 @@ constexpr Format kFormats[] = {
     {"application/rtf", "rich-text", Program::kGeneral, 1},
     {"message/rfc822", "mail", Program::kMail, 1},
     {"application/mbox", "mail", Program::kMail, 1},
+    {"multipart/related", "mail", Program::kMail, 1},
     {"application/zip", "archive", Program::kGeneral, 2},
     {"application/java-archive", "archive", Program::kGeneral, 1},
     {"application/x-tar", "archive", Program::kGeneral, 2},

@@ -1,6 +1,7 @@
 #include <algorithm>
 #include <initializer_list>
 #include <iterator>
+#include <string>
 
 #include <kova/content_type.h>
 
@@ -171,13 +172,64 @@ bool IsTransportStream(std::string_view head) {
   return false;
 }
 
+/// Without a mark of Unicode and blanks, which may stand before markup.
+std::string_view FromFirstCharacter(std::string_view head) {
+  if (head.substr(0, 3) == "\xEF\xBB\xBF"sv) head.remove_prefix(3);
+  return head.substr(std::min(head.find_first_not_of(" \t\r\n"), head.size()));
+}
+
 const MarkRow* MarkOf(std::string_view head) {
   static constexpr MarkRow kTransportStream = {0, "G"sv, "video/mp2t", "video/"sv};
   if (IsTransportStream(head)) return &kTransportStream;
+  const std::string_view markup = FromFirstCharacter(head);
   for (const MarkRow& row : kMarks) {
-    if (head.size() >= row.offset && head.substr(row.offset, row.mark.size()) == row.mark) return &row;
+    const std::string_view text = row.mark[0] == '<' ? markup : head;
+    if (text.size() >= row.offset && text.substr(row.offset, row.mark.size()) == row.mark) return &row;
   }
   return nullptr;
+}
+
+/// The name of the header that a line of a mail is, in lower case; empty when it is none.
+std::string HeaderName(std::string_view line) {
+  std::string name(line.substr(0, std::min(line.find(':'), line.size())));
+  for (char& c : name) {
+    if (c <= ' ' || c > '~') return {};
+    if (c >= 'A' && c <= 'Z') c = static_cast<char>(c - 'A' + 'a');
+  }
+  return name.size() < line.size() ? name : std::string();
+}
+
+/// Mail often has no name that says so: in the folders of servers and programs, or saved by hand. Nothing but headers
+/// up to an empty line, and among them such as each mail has.
+bool IsMail(std::string_view head) {
+  static constexpr std::string_view kUsual[] = {"from",       "date",         "subject",     "received",    "to",
+                                                "message-id", "mime-version", "return-path", "content-type"};
+  int usual = 0;
+  for (size_t line_end = head.find('\n'); line_end != std::string_view::npos; line_end = head.find('\n')) {
+    std::string_view line = head.substr(0, line_end);
+    head.remove_prefix(line_end + 1);
+    if (!line.empty() && line.back() == '\r') line.remove_suffix(1);
+    if (line.empty()) break;
+    if (line[0] == ' ' || line[0] == '\t') continue;
+    const std::string name = HeaderName(line);
+    if (name.empty()) return false;
+    if (std::find(std::begin(kUsual), std::end(kUsual), name) != std::end(kUsual)) ++usual;
+    if (name == "mime-version") ++usual;  // of a saved page there is little more
+  }
+  return usual >= 3;
+}
+
+/// A box of mails: "From", who, and when, on a day of the week; then the first mail.
+bool IsMailBox(std::string_view head) {
+  if (head.substr(0, 5) != "From "sv) return false;
+  const size_t line_end = std::min(head.find('\n'), head.size());
+  return head.substr(0, line_end).find(':') != std::string_view::npos &&
+         IsMail(head.substr(std::min(line_end + 1, head.size())));
+}
+
+const char* TypeOfMail(std::string_view head) {
+  if (IsMailBox(head)) return "application/mbox";
+  return IsMail(head) ? "message/rfc822" : nullptr;
 }
 
 bool Holds(const MarkRow& mark, std::string_view type) {
@@ -214,8 +266,12 @@ bool IsTextUnderAnotherName(std::string_view type, std::string_view head) {
 const char* TypeOf(std::string_view extension, std::string_view head) {
   const char* by_name = TypeByExtension(extension);
   const MarkRow* mark = MarkOf(head);
-  if (mark == nullptr && by_name != nullptr && IsTextUnderAnotherName(by_name, head)) return "text/plain";
-  if (mark == nullptr) return by_name;
+  if (mark == nullptr) {
+    const bool is_other = by_name != nullptr && IsTextUnderAnotherName(by_name, head);
+    if (by_name != nullptr && !is_other) return by_name;
+    const char* mail = TypeOfMail(head);
+    return mail != nullptr || by_name == nullptr ? mail : "text/plain";
+  }
   const char* by_mark = mark->type == "application/zip"sv ? TypeOfZip(head) : mark->type;
   if (by_name == nullptr) return by_mark;
   const bool is_binary = head.find('\0') != std::string_view::npos;
