@@ -64,7 +64,8 @@ class CorpusTest(InstanceTestCase):
         with ThreadPoolExecutor(os.cpu_count()) as threads:
             faults = [fault for found in threads.map(faults_of, self.files) for fault in found]
         self.assertTrue(self.files)
-        self.assertFalse(faults, f"{len(faults)} faults in {len(self.files)} files:\n" + "\n".join(faults))
+        if faults:
+            self.fail(f"{len(faults)} faults in {len(self.files)} files:\n" + "\n".join(faults))
 
 
 if __name__ == "__main__":
