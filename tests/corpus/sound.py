@@ -1,0 +1,230 @@
+"""Music and other sound: real recordings, with tags in several languages and of several ages.
+
+How long, how fast and how wide each is, mutagen says; it also writes the tags, except those of old kinds.
+"""
+
+import os
+import shutil
+import struct
+import tempfile
+
+import tools
+
+DONORS = [tools.MUTAGEN]
+
+# Of a language: title, artist, album, genre, composer, comment.
+TAGS = {
+    "russian": ("Группа крови", "Виктор Цой", "Легенда", "Рок", "Чайковский", "запись с концерта"),
+    "japanese": ("戦場のメリークリスマス", "坂本龍一", "音楽図鑑", "映画音楽", "滝廉太郎", "東京公演"),
+    "german": ("Größer als wir", "Die Ärzte", "Geräusch", "Müßiggang", "Händel", "für Übungen"),
+}
+FIELDS = ("Title", "Authors", "Album", "MusicalGenre", "Composer", "Comment")
+FRAMES = ("TIT2", "TPE1", "TALB", "TCON", "TCOM")
+WAV, AIFF, OGG, MP4 = "audio/x-wav", "audio/x-aiff", "audio/ogg", "audio/mp4"
+
+# taglib's samples: name, format here, how the tags are written, the MIME type.
+BASES = [
+    ("xing.mp3", "mp3", "id3", "audio/mpeg"), ("silence-44-s.flac", "flac", "vorbis", "audio/flac"),
+    ("test.ogg", "ogg", "vorbis", OGG), ("correctness_gain_silent_output.opus", "opus", "vorbis", OGG),
+    ("empty.spx", "spx", "vorbis", OGG), ("empty_flac.oga", "oga", "vorbis", OGG), ("no-tags.m4a", "m4a", "mp4", MP4),
+    ("empty_alac.m4a", "m4b", "mp4", MP4), ("empty.wav", "wav", "id3", WAV), ("empty.aiff", "aiff", "id3", AIFF),
+    ("mac-399.ape", "ape", "ape", "audio/x-ape"), ("click.wv", "wv", "ape", "audio/x-wavpack"),
+    ("click.mpc", "mpc", "ape", "audio/x-musepack"), ("silence-1.wma", "wma", "asf", "audio/x-ms-wma"),
+    ("empty.tta", "tta", "id3", "audio/x-tta"),
+]
+# Without tags of ours.
+AS_THEY_ARE = """
+lame_vbr.mp3 mpeg2.mp3 bladeenc.mp3 rare_frames.mp3 sinewave.flac multiple-vc.flac empty_vorbis.oga lowercase-fields.ogg
+has-tags.m4a alaw.wav float64.wav uint8we.wav pcm_with_fact_chunk.wav noise.aif alaw.aifc mac-396.ape mac-390-hdr.ape
+four_channels.wv tagged.wv sv8_header.mpc lossless.wma tagged.tta
+""".split()
+# Of these another program is wrong about a number, as ffprobe and the length of their data show.
+NO_NUMBERS = ("rare_frames.mp3", "mac-390-hdr.ape", "lossless.wma", "lowercase-fields.ogg", "four_channels.wv")
+NAMES = {
+    "ape": ("Title", "Artist", "Album", "Genre", "Composer", "Comment"),
+    "asf": ("Title", "Author", "WM/AlbumTitle", "WM/Genre", "WM/Composer", "Description"),
+    "mp4": ("\xa9nam", "\xa9ART", "\xa9alb", "\xa9gen", "\xa9wrt", "\xa9cmt"),
+    "vorbis": ("title", "artist", "album", "genre", "composer", "comment"),
+}
+
+
+def donor(corpus, name):
+    return corpus.source_donor("taglib", f"tests/data/{name}")
+
+
+def numbers_of(corpus, path):
+    """The fields that say how long, how fast and how wide a sound is."""
+    info = tools.mutagen(corpus).File(path).info
+    fields = {}
+    if getattr(info, "length", 0) > 0.1:
+        fields["KOVAMDDurationSecond"] = tools.near(info.length, 0.05)
+    for name, field in (("sample_rate", "AudioSampleRate"), ("channels", "AudioChannelCount")):
+        if getattr(info, name, 0):
+            fields["KOVAMD" + field] = getattr(info, name)
+    return fields
+
+
+def write_id3(corpus, path, texts, version=4, encoding=3):
+    """Frames of ID3; in encoding 0 a text stands in its language's own code page, as old programs wrote it."""
+    id3 = tools.mutagen(corpus, "id3")
+    file = tools.mutagen(corpus).File(path)
+    if file.tags is None:
+        file.add_tags()
+    file.tags.clear()
+    for name, text in zip(FRAMES, texts):
+        file.tags.add(getattr(id3, name)(encoding=encoding, text=[text]))
+    file.tags.add(id3.COMM(encoding=encoding, lang="und", desc="", text=[texts[5]]))
+    file.tags.add(id3.TRCK(encoding=0, text=["7/12"]))
+    file.tags.add(id3.TDRC(encoding=0, text=["1988"]))
+    if version == 3:
+        file.tags.update_to_v23()
+    file.save(**({} if path.endswith((".tta", ".dsf")) else {"v2_version": version}))
+
+
+def write_tags(corpus, path, how, texts):
+    if how == "id3":
+        return write_id3(corpus, path, texts)
+    file = tools.mutagen(corpus).File(path)
+    if file.tags is None:
+        file.add_tags()
+    for name, text in zip(NAMES[how], texts):
+        file.tags[name] = [text]
+    numbers = {"ape": ("Track", "Year", "7", "1988"), "asf": ("WM/TrackNumber", "WM/Year", "7", "1988"),
+               "mp4": ("trkn", "\xa9day", (7, 12), "1988"), "vorbis": ("tracknumber", "date", "7", "1988")}[how]
+    file.tags[numbers[0]], file.tags[numbers[1]] = [numbers[2]], [numbers[3]]
+    return file.save()
+
+
+def expected(texts):
+    fields = {"KOVAMD" + name: text for name, text in zip(FIELDS, texts)}
+    return dict(fields, KOVAMDAudioTrackNumber=7, KOVAMDRecordingYear=1988)
+
+
+def add_with_tags(corpus, work):
+    for name, extension, how, mime in BASES:
+        for language, texts in TAGS.items():
+            path = f"{work}/{language}.{extension}"
+            shutil.copyfile(donor(corpus, name), path)
+            write_tags(corpus, path, how, texts)
+            numbers = {} if name in NO_NUMBERS else numbers_of(corpus, path)
+            corpus.add(f"{extension}/{language}.{extension}", path, [texts[1].split()[-1]], dict(numbers, **expected(texts)),
+                       mime=mime)
+
+
+def id3_1(texts, code_page):
+    """The oldest tag: 128 bytes at the end, of no known encoding."""
+    title, artist, album, _, _, comment = [text.encode(code_page)[:28] for text in texts]
+    return struct.pack("<3s30s30s30s4s28sBBB", b"TAG", title, artist, album, b"1988", comment, 0, 7, 17)
+
+
+def without_tags(corpus, work):
+    path = f"{work}/plain.mp3"
+    shutil.copyfile(donor(corpus, "xing.mp3"), path)
+    tools.mutagen(corpus, "id3").delete(path)
+    return path
+
+
+def add_old_tags(corpus, work):
+    plain = without_tags(corpus, work)
+    with open(plain, "rb") as file:
+        frames = file.read()
+    for language, code_page in (("russian", "cp1251"), ("japanese", "cp932"), ("german", "latin-1")):
+        texts = TAGS[language]
+        title = texts[0].encode(code_page)[:28].decode(code_page, "ignore")
+        corpus.add(f"mp3/first_{language}.mp3", frames + id3_1(texts, code_page), fields={
+            "KOVAMDTitle": title, "KOVAMDAuthors": texts[1], "KOVAMDAudioTrackNumber": 7, "KOVAMDRecordingYear": 1988,
+            "KOVAMDMusicalGenre": "Rock"})
+        path = f"{work}/raw_{language}.mp3"
+        shutil.copyfile(plain, path)
+        write_id3(corpus, path, [text.encode(code_page).decode("latin-1") for text in texts], 3, 0)
+        corpus.add(f"mp3/raw_{language}.mp3", path, fields=expected(texts))
+        path = f"{work}/wide_{language}.mp3"
+        shutil.copyfile(plain, path)
+        write_id3(corpus, path, texts, 3, 1)
+        corpus.add(f"mp3/wide_{language}.mp3", path, [texts[1].split()[-1]], expected(texts))
+    path = f"{work}/chinese.mp3"
+    shutil.copyfile(plain, path)
+    texts = ("青花瓷", "周杰伦", "我很忙", "流行音乐", "方文山", "现场录音")
+    write_id3(corpus, path, [text.encode("gbk").decode("latin-1") for text in texts], 3, 0)
+    corpus.add("mp3/raw_chinese.mp3", path, fields=expected(texts))
+
+
+def samples(seconds=2, rate=8000):
+    """A saw of 16 bits, high byte first."""
+    return b"".join(struct.pack(">h", (i * 900) % 20000 - 10000) for i in range(seconds * rate))
+
+
+def au(note):
+    note = note.encode() + b"\0"
+    note += b"\0" * (-len(note) % 8)
+    return struct.pack(">4sIIIII", b".snd", 24 + len(note), len(samples()), 3, 8000, 1) + note + samples()
+
+
+def aiff(chunks):
+    def chunk(name, data):
+        return name + struct.pack(">I", len(data)) + data + b"\0" * (len(data) % 2)
+    rate = struct.pack(">HQ", 16383 + 12, 8000 << 51)
+    body = chunk(b"COMM", struct.pack(">hIh", 1, 16000, 16) + rate)
+    body += b"".join(chunk(name, text.encode()) for name, text in chunks) + chunk(b"SSND", b"\0" * 8 + samples())
+    return b"FORM" + struct.pack(">I", len(body) + 4) + b"AIFF" + body
+
+
+def caf(texts):
+    def chunk(name, data):
+        return name + struct.pack(">q", len(data)) + data
+    info = b"".join(name.encode() + b"\0" + text.encode() + b"\0" for name, text in texts)
+    return (b"caff\0\1\0\0" + chunk(b"desc", struct.pack(">d4sIIIII", 8000, b"lpcm", 0, 2, 1, 1, 16)) +
+            chunk(b"info", struct.pack(">I", len(texts)) + info) + chunk(b"data", b"\0" * 4 + samples()))
+
+
+def wav_with_info(texts):
+    def chunk(name, data):
+        return name + struct.pack("<I", len(data)) + data + b"\0" * (len(data) % 2)
+    body = b"WAVE" + chunk(b"fmt ", struct.pack("<HHIIHH", 1, 1, 8000, 16000, 2, 16))
+    body += chunk(b"LIST", b"INFO" + b"".join(chunk(name, text.encode() + b"\0") for name, text in texts))
+    return b"RIFF" + struct.pack("<I", len(body) + 8 + len(samples())) + body + chunk(b"data", samples())
+
+
+def dsf():
+    """Half a second of two channels, each of one bit, 2,822,400 times a second."""
+    bits = 1411200
+    data = b"\x69" * (-(-bits // 8 // 4096) * 4096 * 2)
+    head = b"DSD " + struct.pack("<QQQ", 28, 92 + len(data), 0)
+    form = b"fmt " + struct.pack("<QIIIIIIQII", 52, 1, 0, 2, 2, 2822400, 1, bits, 4096, 0)
+    return head + form + b"data" + struct.pack("<Q", 12 + len(data)) + data
+
+
+def add_made_here(corpus, work):
+    numbers = {"KOVAMDDurationSecond": tools.near(2), "KOVAMDAudioSampleRate": 8000, "KOVAMDAudioChannelCount": 1}
+    for language, (title, artist, album, genre, composer, comment) in TAGS.items():
+        named = {"KOVAMDTitle": title, "KOVAMDAuthors": artist}
+        lines = f"title={title}\nartist={artist}\nalbum={album}\ntrack=7"
+        corpus.add(f"au/{language}.au", au(lines), [album], dict(numbers, **named), mime="audio/basic")
+        corpus.add(f"caf/{language}.caf", caf([("title", title), ("artist", artist), ("comments", comment)]), fields=dict(
+            numbers, KOVAMDComment=comment, **named), mime="audio/x-caf")
+        corpus.add(f"aiff/chunks_{language}.aiff", aiff([(b"NAME", title), (b"AUTH", artist), (b"ANNO", comment)]),
+                   fields=dict(numbers, KOVAMDComment=comment, **named), mime=AIFF)
+        info = [(b"INAM", title), (b"IART", artist), (b"IGNR", genre), (b"ICMT", comment), (b"ICOP", composer)]
+        corpus.add(f"wav/info_{language}.wav", wav_with_info(info), fields=dict(
+            numbers, KOVAMDMusicalGenre=genre, KOVAMDCopyright=composer, KOVAMDCodecs="PCM", **named), mime=WAV)
+        path = f"{work}/{language}.dsf"
+        with open(path, "wb") as file:
+            file.write(dsf())
+        write_id3(corpus, path, TAGS[language])
+        corpus.add(f"dsf/{language}.dsf", path, fields=dict(expected(TAGS[language]), KOVAMDAudioSampleRate=2822400,
+                                                            KOVAMDDurationSecond=tools.near(0.5)), mime="audio/x-dsd")
+
+
+def make(corpus):
+    with tempfile.TemporaryDirectory() as work:
+        add_with_tags(corpus, work)
+        add_old_tags(corpus, work)
+        add_made_here(corpus, work)
+    for name in AS_THEY_ARE:
+        path = donor(corpus, name)
+        extension = os.path.splitext(name)[1][1:]
+        corpus.add(f"{extension}/taglib_{name}", path, fields={} if name in NO_NUMBERS else numbers_of(corpus, path))
+    for name, title in (("test.mod", "title of song"), ("test.s3m", "test song name"), ("test.it", "test song name")):
+        corpus.add(f"mod/of_taglib_{name}", donor(corpus, name), fields={"KOVAMDTitle": title}, mime="audio/x-mod")
+    corpus.add("mp3/exiftool.mp3", tools.sample(corpus, "MP3.mp3"), ["bang"], {"KOVAMDTitle": "ExifTool Test",
+                                                                            "KOVAMDComposer": "A Composer"})
