@@ -2,10 +2,11 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <limits>
 #include <memory>
 #include <ostream>
-#include <sstream>
 #include <streambuf>
+#include <utility>
 
 #include <json/reader.h>
 #include <json/writer.h>
@@ -25,6 +26,7 @@ class CappedBuffer : public std::streambuf {
  public:
   explicit CappedBuffer(size_t limit_bytes) : limit_bytes_(limit_bytes) {}
   std::string Text() const { return cut_ ? text_ + "..." : text_; }
+  std::string Take() { return std::move(text_); }
 
  protected:
   std::streamsize xsputn(const char* data, std::streamsize size) override {
@@ -91,11 +93,14 @@ bool fromString(Json::Value& value, const std::string& text) {
   return false;
 }
 
+/// A stream would take a text that memory was too short for as written, and a part of it would pass for the whole.
 std::string toString(const Json::Value& value) {
   thread_local const std::unique_ptr<Json::StreamWriter> writer(WriterBuilder("").newStreamWriter());
-  std::ostringstream text;
-  (void)writer->write(value, &text);
-  return text.str();
+  CappedBuffer buffer(std::numeric_limits<size_t>::max());
+  std::ostream stream(&buffer);
+  stream.exceptions(std::ios::badbit);
+  (void)writer->write(value, &stream);
+  return buffer.Take();
 }
 
 bool fromFile(Json::Value& value, const std::string& path) {

@@ -1,4 +1,5 @@
 #include <getopt.h>
+#include <malloc.h>
 
 #include <cstdio>
 #include <cstdlib>
@@ -39,6 +40,7 @@ bool ParseArguments(int argc, char** argv, ferrox::indexd::IndexDaemon::Options&
 }  // namespace
 
 int main(int argc, char** argv) try {
+  (void)mallopt(M_ARENA_MAX, 2);  // each of many threads holds a document for a moment
   ferrox::indexd::IndexDaemon::Options options;
   const char* answer = nullptr;
   const bool understood = ParseArguments(argc, argv, options, answer);

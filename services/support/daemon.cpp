@@ -1,6 +1,7 @@
 #include "services/support/daemon.h"
 
 #include <fcntl.h>
+#include <pthread.h>
 #include <signal.h>
 #include <sys/file.h>
 #include <sys/signalfd.h>
@@ -32,6 +33,16 @@ UniqueFd BlockSignals() {
   (void)pthread_sigmask(SIG_BLOCK, &set, nullptr);
   (void)signal(SIGHUP, SIG_IGN);
   return UniqueFd(signalfd(-1, &set, SFD_CLOEXEC | SFD_NONBLOCK));
+}
+
+/// The threads of a daemon need little of it, and there are many; where address space is short, it would be gone.
+void MakeStacksSmall() {
+  constexpr size_t kStackBytes = 2 << 20;
+  pthread_attr_t attributes;
+  (void)pthread_attr_init(&attributes);
+  (void)pthread_attr_setstacksize(&attributes, kStackBytes);
+  (void)pthread_setattr_default_np(&attributes);
+  (void)pthread_attr_destroy(&attributes);
 }
 
 /// A process that was killed lets go of its locks only when the last of its threads has ended.
@@ -73,6 +84,7 @@ Daemon::Daemon(const std::string& name) : name_(name) {
     FERROX_FAIL_IF(!MakeFolders(InstancePath(folder)), Error::kInternal,
                    "cannot make " + InstancePath(folder) + ": " + ErrnoText());
   }
+  MakeStacksSmall();
   stop_fd_ = BlockSignals();
   FERROX_FAIL_IF(!stop_fd_.Valid(), Error::kInternal, "signalfd: " + ErrnoText());
   pid_file_ = TakePidFile(InstancePath(("/var/run/" + name_ + ".pid").c_str()), name_);

@@ -1,5 +1,11 @@
 #include "common/json_util.h"
 
+#include <sys/resource.h>
+#include <unistd.h>
+
+#include <fstream>
+#include <new>
+
 #include "tests/support/library_test.h"
 
 namespace ferrox {
@@ -31,6 +37,27 @@ TEST(JsonUtilTest, ErrorTextOfADeepDocumentIsBounded) {
   ASSERT_TRUE(fromString(deep, text + "1" + std::string(900, ']')));
   EXPECT_LT(AppendData(deep).size(), 70000U);
 }
+
+#if !defined(__SANITIZE_ADDRESS__) && !defined(__SANITIZE_THREAD__)
+TEST(JsonUtilDeathTest, TextThatMemoryIsTooShortForIsNoText) {
+  const auto write_with_little_memory = [] {
+    Json::Value value(Json::arrayValue);
+    for (int i = 0; i < 1000; ++i) value.append(std::string(65536, 'x'));
+    unsigned long pages = 0;
+    std::ifstream("/proc/self/statm") >> pages;
+    const rlim_t bytes = rlim_t{pages} * static_cast<rlim_t>(getpagesize()) + (21 << 20);
+    const rlimit limit = {bytes, bytes};
+    (void)setrlimit(RLIMIT_AS, &limit);
+    try {
+      (void)toString(value);
+    } catch (const std::bad_alloc&) {
+      _exit(0);
+    }
+    _exit(1);
+  };
+  EXPECT_EXIT(write_with_little_memory(), testing::ExitedWithCode(0), "");
+}
+#endif
 
 }  // namespace
 
