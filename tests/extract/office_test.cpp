@@ -1,5 +1,6 @@
 #include <gtest/gtest.h>
 
+#include "services/kovacontentextractd/readers/cell_numbers.h"
 #include "services/kovacontentextractd/readers/electronic_book.h"
 #include "services/kovacontentextractd/readers/office_open.h"
 #include "services/kovacontentextractd/readers/open_document.h"
@@ -130,8 +131,30 @@ TEST(OfficeOpenTest, TextDocument) {
 }
 
 TEST(OfficeOpenTest, WorkbookShowsNumbersAndDatesAsPeopleSeeThem) {
-  EXPECT_EQ("Umsätze\nBerlin\n東京\n0.3\t2024-03-01\t2024-03-01 12:00\t2\t\ninline\tmade\t\n",
+  EXPECT_EQ("Umsätze\nBerlin\n東京\n0.3\t2024-03-01\t2024-03-01 12:00\t2 2.00\t\ninline\tmade\t\n",
             Text(Read(&ReadOfficeOpen, WorkbookSample(), "xlsx")));
+}
+
+TEST(OfficeOpenTest, NumbersAreFoundAsTheyAreAndAsTheyAreShown) {
+  const struct {
+    double value;
+    const char* format;
+    std::string text;
+  } kRows[] = {
+      {1234567.891, "#,##0.00", "1234567.891 1,234,567.89"},
+      {-1234.5, "#,##0;[Red](#,##0)", "-1234.5 -1,234"},
+      {0.153, "0.0%", "0.153 15.3%"},
+      {2, "\"USD\" 0.00_)", "2 2.00"},
+      {45352, "[$-409]d\\-mmm\\-yy;@", "2024-03-01"},
+      {0.125, "# ?/?", "0.125"},
+      {1500000, "0.0,,", "1500000"},
+      {1e300, "0.00", "1e+300"},
+      {12, "General", "12"},
+  };
+  for (const auto& row : kRows) EXPECT_EQ(NumberText(row.value, ParseNumberFormat(row.format), false), row.text);
+  EXPECT_EQ(NumberText(0.5, BuiltInNumberFormat(9), false), "0.5 50%");
+  EXPECT_EQ(NumberText(1234.5, BuiltInNumberFormat(4), false), "1234.5 1,234.50");
+  EXPECT_EQ(NumberText(1234.5, BuiltInNumberFormat(11), false), "1234.5") << "powers of ten";
 }
 
 TEST(OfficeOpenTest, SlidesComeInTheOrderInWhichTheyAreShown) {

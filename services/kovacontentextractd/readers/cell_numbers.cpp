@@ -1,5 +1,6 @@
 #include "services/kovacontentextractd/readers/cell_numbers.h"
 
+#include <algorithm>
 #include <array>
 #include <charconv>
 #include <cmath>
@@ -29,27 +30,85 @@ std::string DateText(double days, bool from_1904) {
   return {text.data(), static_cast<size_t>(size)};
 }
 
-}  // namespace
-
-bool IsDateFormat(std::string_view format) {
-  bool quoted = false, bracketed = false;
-  for (size_t i = 0; i < format.size(); ++i) {
-    const char c = format[i];
-    if (c == '"') quoted = !quoted;
-    if (c == '\\' || c == '_' || c == '*') ++i;
-    if (c == '[' || c == ']') bracketed = c == '[';
-    if (!quoted && !bracketed && std::string_view("yYdDhHsS").find(c) != std::string_view::npos) return true;
-  }
-  return false;
-}
-
-bool IsBuiltInDateFormat(int id) { return (id >= 14 && id <= 22) || (id >= 27 && id <= 36) || (id >= 45 && id <= 58); }
-
-std::string NumberText(double value, bool is_date, bool from_1904) {
-  if (is_date) return DateText(value, from_1904);
+std::string GeneralText(double value) {
   std::array<char, 64> text;
   const auto written = std::to_chars(text.data(), text.data() + text.size(), value, std::chars_format::general, 15);
   return {text.data(), written.ptr};
+}
+
+/// With a fixed number of digits behind the point.
+std::string FixedText(double value, const NumberFormat& format) {
+  constexpr double kMax = 1e15;
+  if (format.percent) value *= 100;
+  if (!(std::fabs(value) < kMax)) return {};
+  std::array<char, 64> buffer;
+  const auto written =
+      std::to_chars(buffer.data(), buffer.data() + buffer.size(), value, std::chars_format::fixed, format.decimals);
+  std::string text(buffer.data(), written.ptr);
+  const size_t digits_at = text[0] == '-' ? 1 : 0;
+  size_t at = std::min(text.find('.'), text.size());
+  while (format.grouped && at > digits_at + 3) text.insert(at -= 3, 1, ',');
+  return format.percent ? text + "%" : text;
+}
+
+/// Calls `take` with each character of the format that is no text to be shown, condition, colour or fill.
+template <typename Take>
+void ForEachSign(std::string_view code, Take take) {
+  bool quoted = false, bracketed = false;
+  for (size_t i = 0; i < code.size(); ++i) {
+    const char c = code[i];
+    if (c == '"') quoted = !quoted;
+    if (c == '\\' || c == '_' || c == '*') ++i;
+    if (c == '[' || c == ']') bracketed = c == '[';
+    if (!quoted && !bracketed) take(c);
+  }
+}
+
+bool IsOneOf(char c, std::string_view signs) { return signs.find(c) != std::string_view::npos; }
+
+}  // namespace
+
+NumberFormat ParseNumberFormat(std::string_view code) {
+  constexpr int kDecimalsMax = 15;
+  NumberFormat format;
+  bool in_first = true, has_digits = false, behind_point = false, followed = true;
+  char before = '\0';
+  ForEachSign(code, [&](char c) {
+    if (IsOneOf(c, "yYdDhHsS")) format.kind = NumberFormat::kDate;
+    if (c == ';') in_first = false;  // what follows is for other values: negative ones, zero
+    if (!in_first) return;
+    if (c == '0' || c == '#') {
+      has_digits = true;
+      if (behind_point) ++format.decimals;
+      if (before == ',') format.grouped = true;
+    }
+    if (c == '.') behind_point = true;
+    if (c == '%') format.percent = true;
+    if (IsOneOf(c, "eE/?@gG") || (behind_point && (c == '#' || c == ','))) followed = false;
+    before = c;
+  });
+  const bool scaled = before == ',';
+  if (format.kind != NumberFormat::kDate && has_digits && followed && !scaled && format.decimals <= kDecimalsMax) {
+    format.kind = NumberFormat::kFixed;
+  }
+  return format;
+}
+
+NumberFormat BuiltInNumberFormat(int id) {
+  if ((id >= 14 && id <= 22) || (id >= 27 && id <= 36) || (id >= 45 && id <= 58)) return {NumberFormat::kDate};
+  const bool is_sum = id >= 37 && id <= 44;
+  const bool no_decimals =
+      id == 1 || id == 3 || id == 5 || id == 6 || id == 9 || id == 37 || id == 38 || id == 41 || id == 42;
+  if ((id < 1 || id > 10) && !is_sum) return {};
+  const bool percent = id == 9 || id == 10;
+  return {NumberFormat::kFixed, no_decimals ? 0 : 2, id >= 3 && !percent, percent};
+}
+
+std::string NumberText(double value, const NumberFormat& format, bool from_1904) {
+  if (format.kind == NumberFormat::kDate) return DateText(value, from_1904);
+  std::string text = GeneralText(value);
+  const std::string shown = format.kind == NumberFormat::kFixed ? FixedText(value, format) : std::string();
+  return shown.empty() || shown == text ? text : text + " " + shown;
 }
 
 }  // namespace ferrox::extract

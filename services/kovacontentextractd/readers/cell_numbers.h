@@ -5,11 +5,21 @@
 
 namespace ferrox::extract {
 
-/// Whether a spreadsheet shows numbers in this format, or in the built-in one of this number, as a date or a time.
-bool IsDateFormat(std::string_view format);
-bool IsBuiltInDateFormat(int id);
+/// How a sheet shows a number, as far as it is followed here.
+struct NumberFormat {
+  enum Kind { kGeneral, kFixed, kDate };
+  Kind kind = kGeneral;
+  int decimals = 0;      ///< of kFixed, as the other two
+  bool grouped = false;  ///< with a comma after each three digits
+  bool percent = false;
+};
 
-/// A number as a sheet shows it, as far as that takes no knowledge of its format. Dates are days since 1900, or 1904.
-std::string NumberText(double value, bool is_date, bool from_1904);
+NumberFormat ParseNumberFormat(std::string_view code);
+/// The format that programs have under this number without writing it down.
+NumberFormat BuiltInNumberFormat(int id);
+
+/// A number as it is, and behind it as the sheet shows it where that is something else, so that it is found by both.
+/// Dates, which are days since 1900, or 1904, are written as 2024-03-01.
+std::string NumberText(double value, const NumberFormat& format, bool from_1904);
 
 }  // namespace ferrox::extract

@@ -1,6 +1,6 @@
 #include <algorithm>
 #include <bit>
-#include <set>
+#include <map>
 #include <string>
 #include <vector>
 
@@ -241,17 +241,15 @@ class WorkbookReader {
   }
 
   bool TakeFormat(std::string_view record) {
-    if (date_formats_.size() < kStylesMax && IsDateFormat(Text(record, 2, biff8_ ? 2 : 1))) {
-      date_formats_.insert(Little16(record, 0));
-    }
+    if (formats_.size() < kStylesMax)
+      formats_[Little16(record, 0)] = ParseNumberFormat(Text(record, 2, biff8_ ? 2 : 1));
     return true;
   }
 
   bool TakeStyle(std::string_view record) {
-    const int format = Little16(record, 2);
-    if (style_is_date_.size() < kStylesMax) {
-      style_is_date_.push_back(date_formats_.contains(format) || IsBuiltInDateFormat(format));
-    }
+    const int id = Little16(record, 2);
+    const auto own = formats_.find(id);
+    if (styles_.size() < kStylesMax) styles_.push_back(own != formats_.end() ? own->second : BuiltInNumberFormat(id));
     return true;
   }
 
@@ -288,8 +286,8 @@ class WorkbookReader {
   }
 
   bool AddValue(uint16_t row, uint16_t style, double value) {
-    const bool is_date = style < style_is_date_.size() && style_is_date_[style];
-    return AddInRow(row, NumberText(value, is_date, from_1904_));
+    const NumberFormat format = style < styles_.size() ? styles_[style] : NumberFormat();
+    return AddInRow(row, NumberText(value, format, from_1904_));
   }
 
   bool AddCell(std::string_view record, const std::string& text) { return AddInRow(Little16(record, 0), text); }
@@ -315,8 +313,8 @@ class WorkbookReader {
   uint16_t row_ = 0;
   size_t cell_bytes_ = 6;         ///< before a cell's value: its row, column and style
   size_t object_characters_ = 0;  ///< of a drawing's text that are still to come
-  std::set<int> date_formats_;
-  std::vector<bool> style_is_date_;
+  std::map<int, NumberFormat> formats_;
+  std::vector<NumberFormat> styles_;
 };
 
 }  // namespace

@@ -101,6 +101,7 @@ class ContentReader {
       findings_.Break();
     } else if (name == "table-cell") {
       ++cells_;
+      NoteValue();
     } else if (name == "object") {
       AddObject(xml_.PrefixedAttribute("href"));
     } else if (paragraphs_ > 0) {
@@ -119,9 +120,23 @@ class ContentReader {
       }
     } else if (name == "table-cell") {
       --cells_;
+      AddValue();
     } else if (name == "table-row" || (paragraphs_ > 0 && IsAside(name))) {
       findings_.Break();
     }
+  }
+
+  /// A sheet's cell has its number or date twice, as it is and as it is shown.
+  void NoteValue() {
+    value_ = xml_.PrefixedAttribute(xml_.PrefixedAttribute("value-type") == "date" ? "date-value" : "value");
+    value_.resize(std::min(value_.find("T00:00:00"), value_.size()));
+    cell_begin_ = findings_.Text().size();
+  }
+
+  void AddValue() {
+    const bool is_new = !value_.empty() && findings_.Text().find(value_, cell_begin_) == std::string::npos;
+    if (is_new && findings_.AddText(value_)) (void)findings_.AddText("\t");
+    value_.clear();
   }
 
   void AddObject(std::string_view address) {
@@ -135,6 +150,8 @@ class ContentReader {
   int wanted_;          ///< more than 0 where text is taken
   int paragraphs_ = 0;  ///< a paragraph may hold others: notes, text in drawings
   int cells_ = 0;
+  std::string value_;  ///< of the present cell
+  size_t cell_begin_ = 0;
 };
 
 }  // namespace

@@ -1,7 +1,7 @@
 #include <algorithm>
 #include <charconv>
+#include <map>
 #include <memory>
-#include <set>
 
 #include "services/kovacontentextractd/readers/cell_numbers.h"
 #include "services/kovacontentextractd/readers/office_package.h"
@@ -18,7 +18,7 @@ constexpr size_t kStylesMax = 65536;
 struct Workbook {
   std::vector<std::string> sheets;  ///< the ids of their relations
   bool from_1904 = false;           ///< days are counted from 1904, not from 1900
-  std::vector<bool> style_is_date;
+  std::vector<NumberFormat> styles;
 };
 
 /// Runs `each` on every token of the part until it answers false. False then.
@@ -40,20 +40,20 @@ int ToInt(std::string_view text) {
 }
 
 void ReadStyles(ZipContainer& zip, const std::string& part, Workbook& workbook) {
-  std::set<int> date_formats;
+  std::map<int, NumberFormat> formats;
   bool in_cell_styles = false;
   (void)ForEachToken(zip, part, [&](XmlTokenizer& xml, Token token) {
     if (token == Token::kText) return true;
     if (xml.Name() == "cellXfs") {
       in_cell_styles = token == Token::kOpen;
-    } else if (token == Token::kOpen && xml.Name() == "numFmt") {
-      const bool is_date = IsDateFormat(xml.Attribute("formatCode"));
-      if (is_date && date_formats.size() < kStylesMax) date_formats.insert(ToInt(xml.Attribute("numFmtId")));
+    } else if (token == Token::kOpen && xml.Name() == "numFmt" && formats.size() < kStylesMax) {
+      formats[ToInt(xml.Attribute("numFmtId"))] = ParseNumberFormat(xml.Attribute("formatCode"));
     } else if (token == Token::kOpen && in_cell_styles && xml.Name() == "xf") {
       const int id = ToInt(xml.Attribute("numFmtId"));
-      workbook.style_is_date.push_back(date_formats.contains(id) || IsBuiltInDateFormat(id));
+      const auto own = formats.find(id);
+      workbook.styles.push_back(own != formats.end() ? own->second : BuiltInNumberFormat(id));
     }
-    return workbook.style_is_date.size() < kStylesMax;
+    return workbook.styles.size() < kStylesMax;
   });
 }
 
@@ -85,11 +85,11 @@ bool AddSharedTexts(ZipContainer& zip, const std::string& part, Findings& findin
 }
 
 /// What is no number stands as it is.
-std::string StoredNumberText(const std::string& stored, bool is_date, bool from_1904) {
+std::string StoredNumberText(const std::string& stored, const NumberFormat& format, bool from_1904) {
   double value = 0;
   const char* end = stored.data() + stored.size();
   if (std::from_chars(stored.data(), end, value).ptr != end) return stored;
-  return NumberText(value, is_date, from_1904);
+  return NumberText(value, format, from_1904);
 }
 
 /// Adds the texts and numbers of the cells of one sheet that do not point into the table of shared texts.
@@ -125,8 +125,8 @@ class SheetReader {
   bool AddCell() {
     const bool is_number = type_.empty() || type_ == "n";
     if (value_.empty() || (!is_number && type_ != "str" && type_ != "inlineStr" && type_ != "d")) return true;
-    const bool is_date = style_ < workbook_.style_is_date.size() && workbook_.style_is_date[style_];
-    const std::string text = is_number ? StoredNumberText(value_, is_date, workbook_.from_1904) : value_;
+    const NumberFormat format = style_ < workbook_.styles.size() ? workbook_.styles[style_] : NumberFormat();
+    const std::string text = is_number ? StoredNumberText(value_, format, workbook_.from_1904) : value_;
     return findings_.AddText(text) && findings_.AddText("\t");
   }
 
