@@ -32,6 +32,7 @@ struct Group {
   Target target = Target::kText;
   const char* field = nullptr;  ///< of kField
   int code_page = 1252;
+  bool is_aside = false;     ///< a note, or another text that stands in the midst of a word but is not of it
   bool is_unicode = false;   ///< holds again, whole, what a group before it has in a code page
   int unicode_fallback = 1;  ///< characters behind a Unicode one, for programs that do not know it
 };
@@ -159,6 +160,7 @@ class RichTextReader {
     FlushBytes();
     if (groups_.size() == kDepthMax) return Stop("damaged");
     groups_.push_back(Top());
+    Top().is_aside = false;
     optional_ = false;
   }
 
@@ -166,6 +168,7 @@ class RichTextReader {
     FlushBytes();
     const Group closed = Top();
     if (groups_.size() > 1) groups_.pop_back();
+    if (closed.is_aside) AddCharacter('\n');
     fallback_left_ = 0;
     if (closed.target != Target::kField || Top().target == Target::kField) return;
     if (closed.is_unicode) findings_.Set(closed.field, value_);
@@ -216,10 +219,7 @@ class RichTextReader {
     if (word == "bin"sv) return SkipBytes(number);
     if (word == "f"sv) return SelectFont(number);
     if (word == "fcharset"sv) return SetCharset(number);
-    if (word == "ansicpg"sv) {
-      if (number > 1) ansi_code_page_ = Top().code_page = number;
-      return;
-    }
+    if (word == "ansicpg"sv) return SetCodePage(number);
     if (word == "mac"sv || word == "pc"sv) {
       ansi_code_page_ = Top().code_page = word == "pc"sv ? 437 : kMacRoman;
       return;
@@ -248,6 +248,8 @@ class RichTextReader {
     if (in_nothing) return;
     Top().target = known ? found->target : Target::kNowhere;
     Top().field = known ? found->field : nullptr;
+    Top().is_aside = Top().target == Target::kText;
+    if (Top().is_aside) AddCharacter('\n');
   }
 
   void SelectFont(int number) {
@@ -258,6 +260,12 @@ class RichTextReader {
     }
     const auto found = fonts_.find(number);
     Top().code_page = found != fonts_.end() && found->second != 0 ? found->second : ansi_code_page_;
+  }
+
+  /// Programs that call their text both ANSI and Mac's have written ANSI.
+  void SetCodePage(int number) {
+    const bool is_ansi = number == kMacRoman && ansi_code_page_ != kMacRoman;
+    if (number > 1) ansi_code_page_ = Top().code_page = is_ansi ? 1252 : number;
   }
 
   void SetCharset(int charset) {
