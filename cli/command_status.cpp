@@ -133,6 +133,9 @@ std::string ContentExtractionText(const Json::Value& daemon) {
     if (piece.isString())
       text += "\n    the workers lack a protection on this system: " + EscapeForTerminal(piece.asString());
   }
+  for (const Json::Value& root : daemon["unresponsive"]) {
+    if (root.isString()) text += "\n    its file system does not answer: " + EscapeForTerminal(root.asString());
+  }
   for (const Json::Value& program : daemon["not_installed"]) {
     if (program.isString())
       text += "\n    not installed: " + EscapeForTerminal(program.asString()) + "; what it reads is found by name only";

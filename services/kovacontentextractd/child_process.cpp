@@ -6,8 +6,10 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
-#include <algorithm>
 #include <cerrno>
+#include <mutex>
+#include <utility>
+#include <vector>
 
 #include "common/unique_fd.h"
 
@@ -18,18 +20,33 @@ namespace {
 using SteadyClock = std::chrono::steady_clock;
 using std::chrono::milliseconds;
 
-/// For a process that was killed to be gone. One that a file system holds in the middle of a read cannot even be
-/// killed: it is left alone then.
+/// For a process that was killed to be gone.
 constexpr milliseconds kEndMax(2000);
 constexpr int kPollMs = 1;
 
+struct HeldProcesses {
+  std::mutex mutex;
+  std::vector<pid_t> pids;
+};
+HeldProcesses g_held;
+
 }  // namespace
 
-void ChildProcess::End() {
-  if (pid_ <= 0) return;
+bool ChildProcess::End() {
+  if (pid_ <= 0) return true;
   (void)kill(pid_, SIGKILL);
   (void)Wait(kEndMax);
-  pid_ = -1;
+  const pid_t held = std::exchange(pid_, -1);
+  if (held <= 0) return true;
+  const std::lock_guard guard(g_held.mutex);
+  g_held.pids.push_back(held);
+  return false;
+}
+
+size_t ChildProcess::Held() {
+  const std::lock_guard guard(g_held.mutex);
+  std::erase_if(g_held.pids, [](pid_t pid) { return waitpid(pid, nullptr, WNOHANG) != 0; });
+  return g_held.pids.size();
 }
 
 std::optional<int> ChildProcess::Wait(milliseconds longest) {

@@ -4,8 +4,9 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
-#include <array>
+#include <algorithm>
 #include <cerrno>
+#include <cstring>
 
 #include <kova/content_type.h>
 
@@ -26,9 +27,8 @@ constexpr char kErrorField[] = "_KOVAExtractError";
 constexpr char kTypeField[] = "KOVAMDContentType";
 
 /// What the document says when the file could not be opened.
-std::string OpenProblem() {
-  if (errno == ELOOP || errno == EXDEV) return "reached through a link";
-  return ErrnoText();
+std::string OpenProblem(int problem) {
+  return problem == ELOOP || problem == EXDEV ? "reached through a link" : strerror(problem);
 }
 
 Json::Value ErrorDocument(const std::string& reason) {
@@ -69,7 +69,10 @@ void FreeTextMemory(int memory) {
   (void)fallocate(memory, FALLOC_FL_PUNCH_HOLE | FALLOC_FL_KEEP_SIZE, 0, info.st_size);
 }
 
-Extractor::Extractor(const WorkerPool::Options& options) : pool_(options) { pool_.Probe(Program::kGeneral); }
+Extractor::Extractor(const WorkerPool::Options& options, const OpenLimit::Options& limit)
+    : pool_(options), open_limit_(limit) {
+  pool_.Probe(Program::kGeneral);
+}
 
 std::string Extractor::Handle(const std::string& request, const services::Peer& peer) {
   TextTarget text(peer.descriptor);
@@ -78,6 +81,7 @@ std::string Extractor::Handle(const std::string& request, const services::Peer& 
         if (type == "status") {
           Json::Value status = pool_.Status();
           status["pid"] = getpid();
+          status["unresponsive"] = open_limit_.Held();
           return status;
         }
         FERROX_FAIL_IF_AS(type != "extract", "type != \"extract\"", Error::kBadArgument, "unknown command " + type);
@@ -94,30 +98,49 @@ std::string Extractor::Handle(const std::string& request, const services::Peer& 
 
 Json::Value Extractor::Extract(const std::string& root, const std::string& path, TextTarget& text) {
   Json::Value found;
-  const UniqueFd file = OpenBeneath(root, path);
-  struct stat info = {};
-  if (!file.Valid() && (errno == ENOENT || errno == ENOTDIR)) {
+  const OpenedFile file = OpenFile(root, path);
+  if (file.problem == ENOENT || file.problem == ENOTDIR) {
     found["gone"] = true;
-  } else if (!file.Valid() || fstat(file.Get(), &info) != 0) {
-    found["document"] = ErrorDocument(OpenProblem());
+    return found;
+  }
+  if (file.inode != 0) found["inode"] = Json::UInt64(file.inode);
+  if (file.problem != 0) {
+    found["document"] = ErrorDocument(OpenProblem(file.problem));
+  } else if (!file.regular) {
+    found["document"] = ErrorDocument("not a regular file");
   } else {
-    found["inode"] = Json::UInt64(info.st_ino);
-    found["document"] = S_ISREG(info.st_mode) ? Read(file.Get(), path, text) : ErrorDocument("not a regular file");
+    found["document"] = Read(file.fd.Get(), file.head, path, text);
   }
   return found;
 }
 
-Json::Value Extractor::Read(int fd, const std::string& path, TextTarget& text) {
-  std::array<char, kHeadBytes> head;
-  const ssize_t got = pread(fd, head.data(), head.size(), 0);
-  if (got < 0) return ErrorDocument(ErrnoText());
+/// All that is done with the file itself: its file system may not answer for ever.
+Extractor::OpenedFile Extractor::OpenFile(const std::string& root, const std::string& path) {
+  const OpenLimit::Turn turn(open_limit_, root);
+  OpenedFile file;
+  struct stat info = {};
+  file.fd = OpenBeneath(root, path);
+  if (!file.fd.Valid() || fstat(file.fd.Get(), &info) != 0) {
+    file.problem = errno;
+    return file;
+  }
+  file.inode = info.st_ino;
+  file.regular = S_ISREG(info.st_mode);
+  if (!file.regular) return file;
+  file.head.resize(kHeadBytes);
+  const ssize_t got = pread(file.fd.Get(), file.head.data(), file.head.size(), 0);
+  if (got < 0) file.problem = errno;
+  file.head.resize(static_cast<size_t>(std::max<ssize_t>(got, 0)));
+  return file;
+}
+
+Json::Value Extractor::Read(int fd, std::string_view head, const std::string& path, TextTarget& text) {
   const Task task = {fd, "", GetFileExtension(Basename(path), true), Basename(path)};
-  const char* type =
-      got == 0 ? TypeByExtension(task.extension) : TypeOf(task.extension, {head.data(), static_cast<size_t>(got)});
+  const char* type = head.empty() ? TypeByExtension(task.extension) : TypeOf(task.extension, head);
   Json::Value document(Json::objectValue);
   if (type != nullptr) document[kTypeField] = type;
   const Format* format = type != nullptr ? FormatOf(type) : &kUnknown;
-  if (got == 0 || format == nullptr) return document;
+  if (head.empty() || format == nullptr) return document;
   const TextSink sink = [&text](size_t offset, std::string_view piece) { text.Take(offset, piece); };
   Answer answer = ReadAs(*format, task, document, sink);
   // What only a look at the bytes of an unknown file tells.

@@ -1,11 +1,14 @@
 #pragma once
 
 #include <cstddef>
+#include <cstdint>
 #include <string>
 #include <string_view>
 
 #include <json/value.h>
 
+#include "common/unique_fd.h"
+#include "services/kovacontentextractd/open_limit.h"
 #include "services/kovacontentextractd/worker_pool.h"
 #include "services/support/frame_server.h"
 
@@ -35,20 +38,32 @@ void FreeTextMemory(int memory);
 /// Answers what the daemon is asked (docs/formats/extract.md). From any thread.
 class Extractor {
  public:
-  explicit Extractor(const WorkerPool::Options& options);
+  Extractor(const WorkerPool::Options& options, const OpenLimit::Options& limit);
 
   /// One request in, its reply out; never throws.
   std::string Handle(const std::string& request, const services::Peer& peer);
+
+  /// Lets requests that are being answered fail soon.
+  void Stop() { pool_.Stop(); }
 
   /// What the file at `path` below the folder `root` holds: "gone" true, or "inode" and "document". The text is put
   /// into `text`. @throws Error kInternal when nobody can read it now.
   Json::Value Extract(const std::string& root, const std::string& path, TextTarget& text);
 
  private:
-  Json::Value Read(int fd, const std::string& path, TextTarget& text);
+  struct OpenedFile {
+    UniqueFd fd;
+    int problem = 0;     ///< an error number
+    uint64_t inode = 0;  ///< 0: unknown
+    bool regular = false;
+    std::string head;  ///< its first bytes
+  };
+  OpenedFile OpenFile(const std::string& root, const std::string& path);
+  Json::Value Read(int fd, std::string_view head, const std::string& path, TextTarget& text);
   Answer ReadAs(const kova::content::Format& format, const Task& task, Json::Value& document, const TextSink& sink);
 
   WorkerPool pool_;
+  OpenLimit open_limit_;
 };
 
 }  // namespace ferrox::extract

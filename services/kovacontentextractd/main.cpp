@@ -20,6 +20,8 @@ constexpr char kHelp[] =
 
 /// For the questions about the daemon's state, which come while all workers are busy.
 constexpr unsigned kSpareThreads = 2;
+/// For those that a file system may hold that does not answer.
+constexpr unsigned kHeldThreads = 8;
 
 /// A client keeps its connection for the next file, and with it the memory for texts.
 constexpr std::chrono::seconds kIdleConnection(10);
@@ -49,12 +51,15 @@ extract::WorkerPool::Options PoolOptions() {
 void Serve() {
   services::Daemon daemon("kovacontentextractd");
   const extract::WorkerPool::Options pool_options = PoolOptions();
-  extract::Extractor extractor(pool_options);
+  extract::OpenLimit::Options limit;
+  limit.at_once = pool_options.workers_max + kHeldThreads;
+  extract::Extractor extractor(pool_options, limit);
   services::FrameServerOptions options;
   options.socket_path = InstancePath(kContentExtractdSocket);
-  options.workers = pool_options.workers_max + kSpareThreads;
+  options.workers = limit.at_once + kSpareThreads;
   options.idle_timeout = kIdleConnection;
   options.takes_descriptors = true;
+  options.on_stop = [&extractor] { extractor.Stop(); };
   options.on_end = &extract::FreeTextMemory;
   services::FrameServer server(options, [&extractor](const std::string& request, const services::Peer& peer) {
     return extractor.Handle(request, peer);

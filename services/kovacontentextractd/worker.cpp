@@ -117,6 +117,12 @@ void Read(const Worker& worker, const Request& request, Findings& findings) try 
   findings.Fail("damaged");
 }
 
+/// Whoever stops the daemon may signal all its processes. A worker goes on until the daemon ends it, or no longer
+/// lives: else the file that it reads would be blamed.
+void LeaveEndToDaemon() {
+  for (const int number : {SIGTERM, SIGINT, SIGHUP, SIGQUIT}) (void)signal(number, SIG_IGN);
+}
+
 /// What one file took, the next one takes: without this, every one would ask the kernel for it and give it back.
 void KeepMemory() {
   (void)mallopt(M_MMAP_THRESHOLD, 32 << 20);
@@ -159,6 +165,7 @@ bool ReceiveFork(int& socket, int& region) {
 }  // namespace
 
 int RunWorker(const Worker& worker, const char* empty_folder) try {
+  LeaveEndToDaemon();
   KeepMemory();
   (void)setenv("TZ", "UTC0", 1);  // else each time in an archive makes the C library look for the zone's file
   worker.prepare();

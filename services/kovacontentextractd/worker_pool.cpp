@@ -61,15 +61,43 @@ class WorkerPool::Lease {
   std::unique_ptr<WorkerProcess> worker_;
 };
 
+/// A worker while it reads a file.
+class WorkerPool::Asked {
+ public:
+  /// @throws Error kInternal when the pool stops.
+  Asked(WorkerPool& pool, WorkerProcess& worker) : pool_(pool), worker_(worker) {
+    const std::lock_guard guard(pool_.mutex_);
+    pool_.FailIfStopping();
+    pool_.asked_.push_back(&worker_);
+  }
+  Asked(const Asked&) = delete;
+  Asked& operator=(const Asked&) = delete;
+  ~Asked() {
+    const std::lock_guard guard(pool_.mutex_);
+    std::erase(pool_.asked_, &worker_);
+  }
+
+ private:
+  WorkerPool& pool_;
+  WorkerProcess& worker_;
+};
+
 WorkerPool::WorkerPool(const Options& options) : options_(options), ender_([this] { EndIdle(); }) {}
 
 WorkerPool::~WorkerPool() {
-  {
-    const std::lock_guard guard(mutex_);
-    stopping_ = true;
-  }
-  something_to_end_.notify_one();
+  Stop();
   ender_.join();
+}
+
+void WorkerPool::Stop() {
+  const std::lock_guard guard(mutex_);
+  stopping_ = true;
+  for (WorkerProcess* worker : asked_) worker->Interrupt();
+  something_to_end_.notify_one();
+}
+
+void WorkerPool::FailIfStopping() const {
+  FERROX_FAIL_IF(stopping_, Error::kInternal, "content extraction is being stopped");
 }
 
 void WorkerPool::Probe(Program program) { const Lease lease(*this, program); }
@@ -79,13 +107,18 @@ bool WorkerPool::Has(Program program) const {
 }
 
 Answer WorkerPool::Read(Program program, const Task& task, const TextSink& text) {
+  FERROX_FAIL_IF(ChildProcess::Held() >= options_.workers_max, Error::kInternal,
+                 "as many workers as there may be hang in a file system that does not answer");
   Answer answer;
   Outcome outcome = Outcome::kNotAsked;
   bool fresh = false;
   for (int attempt = 0; attempt < kAttempts && outcome == Outcome::kNotAsked; ++attempt) {
     Lease lease(*this, program, fresh);
     RawAnswer raw;
-    outcome = lease.Worker().Ask(task, options_.longest_read, raw);
+    {
+      const Asked asked(*this, lease.Worker());
+      outcome = lease.Worker().Ask(task, options_.longest_read, raw);
+    }
     if (outcome == Outcome::kAnswered && !Believe(raw, lease.Worker().Region(), text, answer)) {
       outcome = Outcome::kNonsense;
     }
@@ -96,6 +129,7 @@ Answer WorkerPool::Read(Program program, const Task& task, const TextSink& text)
     }
     if (outcome != Outcome::kAnswered) lease.End();
   }
+  FERROX_FAIL_IF(outcome == Outcome::kHeld, Error::kInternal, "the file system does not answer");
   FERROX_FAIL_IF(outcome == Outcome::kNotAsked, Error::kInternal, "the workers end before they are given a file");
   Count(outcome == Outcome::kAnswered);
   if (outcome == Outcome::kAnswered) return answer;
@@ -106,8 +140,10 @@ Answer WorkerPool::Read(Program program, const Task& task, const TextSink& text)
   return blame;
 }
 
+/// @throws Error kInternal when it was the pool that ended the worker.
 void WorkerPool::Count(bool answered) {
   const std::lock_guard guard(mutex_);
+  if (!answered) FailIfStopping();
   ++files_;
   if (!answered) ++blamed_;
 }
@@ -229,6 +265,8 @@ Json::Value WorkerPool::Status() const {
   Json::Value status;
   status["workers"] = Json::UInt64(busy_ + idle_.size());
   status["workers_max"] = options_.workers_max;
+  status["reading"] = Json::UInt64(asked_.size());
+  status["held"] = Json::UInt64(ChildProcess::Held());
   status["missing"] = missing_;
   status["not_installed"] = Json::Value(Json::arrayValue);
   for (int i = 0; i < kova::content::kPrograms; ++i) {

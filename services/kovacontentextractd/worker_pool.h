@@ -51,8 +51,11 @@ class WorkerPool {
   /// @throws Error kInternal when no worker can be started.
   Answer Read(kova::content::Program program, const Task& task, const TextSink& text);
 
-  /// "workers" and "workers_max", "missing" (what the sandbox lacks), "not_installed" (names of programs), "files" and
-  /// "blamed" since the daemon's start.
+  /// Lets all who have a file read fail soon, with kInternal and no blame, and everybody from now on.
+  void Stop();
+
+  /// "workers" and "workers_max", "reading" (how many read a file), "held" (that cannot be ended), "missing" (what the
+  /// sandbox lacks), "not_installed" (names of programs), "files" and "blamed" since the daemon's start.
   Json::Value Status() const;
 
  private:
@@ -71,6 +74,7 @@ class WorkerPool {
   };
 
   class Lease;
+  class Asked;
   std::unique_ptr<WorkerProcess> TakeIdle(kova::content::Program program);
   std::unique_ptr<WorkerProcess> Take(kova::content::Program program, bool fresh);
   void Give(std::unique_ptr<WorkerProcess> worker, kova::content::Program program);
@@ -81,6 +85,7 @@ class WorkerPool {
   void EndIdle();
   bool EndIdleTemplates(SteadyClock::time_point old);
   void Count(bool answered);
+  void FailIfStopping() const;
 
   const Options options_;
   std::array<Prepared, kova::content::kPrograms> prepared_;
@@ -94,6 +99,7 @@ class WorkerPool {
   uint64_t blamed_ = 0;
   Json::Value missing_ = Json::Value(Json::arrayValue);
   bool stopping_ = false;
+  std::vector<WorkerProcess*> asked_;  ///< those that are reading a file
   std::thread ender_;
 };
 

@@ -64,8 +64,7 @@ WorkerProcess::Outcome WorkerProcess::Ask(const Task& task, milliseconds longest
   if (!Send(task)) return Outcome::kNotAsked;
   const Outcome outcome = Receive(SteadyClock::now() + longest, answer);
   if (outcome == Outcome::kCrashed) return HowItEnded();
-  if (outcome != Outcome::kAnswered) process_.End();
-  return outcome;
+  return outcome == Outcome::kAnswered || process_.End() ? outcome : Outcome::kHeld;
 }
 
 /// Fits into the socket's buffer, so that a worker that takes nothing cannot hold us.
@@ -117,7 +116,7 @@ WorkerProcess::Outcome WorkerProcess::ReceiveSome(char* to, size_t room, TimePoi
 /// What the end of a process says about the file that it was reading.
 WorkerProcess::Outcome WorkerProcess::HowItEnded() {
   const std::optional<int> status = process_.Wait(kEndMax);
-  process_.End();
+  if (!process_.End()) return Outcome::kHeld;
   if (!status) return Outcome::kCrashed;
   if (WIFEXITED(*status)) return WEXITSTATUS(*status) == kExitNoMemory ? Outcome::kNoMemory : Outcome::kCrashed;
   const int signal_number = WTERMSIG(*status);

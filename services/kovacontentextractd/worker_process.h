@@ -1,5 +1,7 @@
 #pragma once
 
+#include <sys/socket.h>
+
 #include <chrono>
 #include <string>
 
@@ -48,9 +50,12 @@ class WorkerProcess {
     kNoMemory,
     kCrashed,
     kNonsense,  ///< it sent what is no frame
+    kHeld,      ///< it cannot even be killed: the file system does not answer
   };
   /// Has it read a file. Unless it answered, it has ended.
   Outcome Ask(const Task& task, std::chrono::milliseconds longest, RawAnswer& answer);
+  /// From another thread: lets Ask return soon, as if the worker had ended.
+  void Interrupt() { (void)shutdown(socket_.Get(), SHUT_RDWR); }
 
  private:
   using TimePoint = std::chrono::steady_clock::time_point;

@@ -122,6 +122,19 @@ TEST_F(WorkerPoolTest, WhatAWorkerDoesBehindItsAnswerIsNotTheNextFilesFault) {
   EXPECT_EQ(0U, pool.Status()["blamed"].asUInt());
 }
 
+TEST_F(WorkerPoolTest, APoolThatStopsBlamesNobody) {
+  WorkerPool pool(TestOptions());
+  EXPECT_EQ("1", Read(pool, "count").text);
+  std::thread stopper([&pool] {
+    while (pool.Status()["reading"].asUInt() == 0) std::this_thread::sleep_for(1ms);
+    pool.Stop();
+  });
+  EXPECT_THROW((void)Read(pool, "hang"), Error);
+  stopper.join();
+  EXPECT_THROW((void)Read(pool, "count"), Error);
+  EXPECT_EQ(0U, pool.Status()["blamed"].asUInt());
+}
+
 TEST_F(WorkerPoolTest, AnAnswerIsNeverTakenForAnotherFiles) {
   WorkerPool pool(TestOptions());
   EXPECT_EQ("of another file", Read(pool, "twice").fields["KOVAMDTitle"].asString()) << "the file's own lie";
