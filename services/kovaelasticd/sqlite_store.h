@@ -88,6 +88,7 @@ class SqliteStore : public IndexStore {
   Totals totals_;
   std::map<int64_t, Pending> pending_;
   int64_t pending_bytes_ = 0;
+  int64_t last_flushed_ = 0;  ///< the id that went into the full-text tables last
   int64_t uncommitted_bytes_ = 0;
   bool in_transaction_ = false;
 

@@ -8,8 +8,11 @@ namespace ferrox::engine {
 
 namespace {
 
-/// Texts wait in so much memory for the full-text tables.
+/// Texts wait in so much memory for the full-text tables. These take rows at any time as long as ids only grow, as
+/// those of new documents do, and then short turns leave readers of files less to wait for; a lower id makes them
+/// write out what they have gathered.
 constexpr int64_t kPendingMaxBytes = 16 << 20;
+constexpr int64_t kPendingNewMaxBytes = 2 << 20;
 /// What a change costs besides its text.
 constexpr int64_t kRowBytes = 512;
 /// More names than that come from no extractor.
@@ -65,7 +68,8 @@ void SqliteStore::CountText(int64_t before, int64_t after) {
 void SqliteStore::Changed(int64_t bytes) {
   pending_bytes_ += bytes;
   uncommitted_bytes_ += bytes + kRowBytes;
-  if (pending_bytes_ >= kPendingMaxBytes) Flush();
+  const bool ids_grow = !pending_.empty() && pending_.begin()->first > last_flushed_;
+  if (pending_bytes_ >= (ids_grow ? kPendingNewMaxBytes : kPendingMaxBytes)) Flush();
 }
 
 int64_t SqliteStore::InsertRow(const DocRow& row, int64_t text_bytes) {
@@ -230,6 +234,7 @@ void SqliteStore::Flush() {
     if (pending.text_changed) FlushText(id, pending);
   }
   for (const auto& [id, pending] : pending_) FlushMeta(id, pending);
+  if (!pending_.empty()) last_flushed_ = pending_.rbegin()->first;
   pending_.clear();
   pending_bytes_ = 0;
 }
