@@ -53,7 +53,7 @@ void Keep(DocumentCursor& cursor, const TreeWalk::Entry& entry, const Comparison
 }
 
 void Judge(DocumentCursor& cursor, const TreeWalk::Entry& entry, const ComparisonActions& actions) {
-  actions.examined();
+  actions.examine();
   RemoveBefore(cursor, entry.path, actions);
   const bool indexed = cursor.Current() != nullptr && cursor.Current()->path == entry.path;
   if (!indexed || !actions.is_current(*cursor.Current(), entry.status)) actions.write(entry.path, entry.status);

@@ -19,7 +19,7 @@ struct ComparisonActions {
   /// The document's file is gone or no longer indexed.
   std::function<void(const std::string& path)> remove;
   /// Each file walked by, before the others.
-  std::function<void()> examined = [] {};
+  std::function<void()> examine = [] {};
 };
 
 /// Compares what lies below `folder` on disk, as `walk` returns it, with the documents that the index has there.

@@ -21,8 +21,8 @@ namespace {
 using fileindex::FileIndexOP;
 
 constexpr auto kCommitInterval = std::chrono::seconds(5);
-/// A comparison that has seen so many files tells how many there are.
-constexpr uint64_t kFilesBeforeCount = 500;
+/// A comparison that takes longer tells how many files there are.
+constexpr auto kTimeBeforeCount = std::chrono::milliseconds(300);
 constexpr unsigned kRemovedAtOnce = 1000;
 /// So few changes are what somebody is waiting for, rather than a folder that is copied.
 constexpr uint64_t kUrgentOperations = 4;
@@ -339,17 +339,22 @@ void OperationRunner::CompareFolder(const std::string& folder) {
 ComparisonActions OperationRunner::Actions(const std::string& folder) {
   ComparisonActions actions;
   actions.is_current = [this](const IndexedEntry& indexed, const struct stat& status) {
-    return writer_.IsCurrent(indexed, status);
+    const bool current = writer_.IsCurrent(indexed, status);
+    if (current) context_.status.FileExamined();
+    return current;
   };
   actions.write = [this](const std::string& path, const struct stat&) {
-    tasks_.Submit([this, path] { writer_.Write(path); });
+    tasks_.Submit([this, path] {
+      writer_.Write(path);
+      context_.status.FileExamined();
+    });
   };
   actions.remove = [this](const std::string& path) { gone_.Add(path); };
   const auto count = std::make_shared<std::unique_ptr<FileCount>>();
-  actions.examined = [this, folder, count, examined = uint64_t{0}]() mutable {
+  const auto count_at = std::chrono::steady_clock::now() + kTimeBeforeCount;
+  actions.examine = [this, folder, count, count_at] {
     context_.interruption.Check();
-    context_.status.FileExamined();
-    if (++examined == kFilesBeforeCount)
+    if (*count == nullptr && std::chrono::steady_clock::now() >= count_at)
       *count = std::make_unique<FileCount>(folder, context_.folders, context_.status);
     CommitIfDue();
   };

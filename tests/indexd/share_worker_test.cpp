@@ -96,6 +96,16 @@ TEST_F(ShareWorkerTest, FilesThatChangeBesideSlowOnesAreWrittenSoon) {
   EXPECT_EQ(2, index->upserts[At("aa")]) << "and again in their turn";
 }
 
+TEST_F(ShareWorkerTest, ProgressCountsWhatIsDone) {
+  for (int i = 0; i < 30; ++i) test::WriteFile(At("f" + std::to_string(i)), "x");
+  unsigned written = 0;
+  index->before_write = [this, &written](const std::string&) {
+    EXPECT_LE(worker->Status()["comparison"]["examined"].asUInt(), written++);
+  };
+  Process(Line(kReindex, root));
+  EXPECT_EQ(written, worker->Status()["comparison"]["examined"].asUInt());
+}
+
 TEST_F(ShareWorkerTest, FileThatIsWrittenWhileItsAttributesAreReadKeepsNoOldText) {
   test::WriteFile(At("f"), "old");
   Process(Line(kCreate, At("f")));
