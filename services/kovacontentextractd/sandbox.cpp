@@ -122,7 +122,8 @@ bool AllowWhere(scmp_filter_ctx filter, int call, const scmp_arg_cmp& argument) 
 bool AddRules(scmp_filter_ctx filter) {
   bool added = true;
   for (const int call : kAllowed) added = Allow(filter, call) && added;
-  if (kSanitized) added = Allow(filter, SCMP_SYS(pipe2)) && added;  // how a sanitizer asks whether memory is there
+  // How a sanitizer asks whether memory is there, and where the stacks are when an exception passes.
+  for (const int call : {SCMP_SYS(pipe2), SCMP_SYS(sigaltstack)}) added = (!kSanitized || Allow(filter, call)) && added;
   const scmp_arg_cmp not_executable = SCMP_A2(SCMP_CMP_MASKED_EQ, PROT_EXEC, 0);
   for (const int call : {SCMP_SYS(mmap), SCMP_SYS(mmap2), SCMP_SYS(mprotect)}) {
     added = AllowWhere(filter, call, not_executable) && added;
