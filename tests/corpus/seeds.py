@@ -1,7 +1,8 @@
 """The smallest well-formed file of each format that is easily made by hand: what hostile files are bent from, and what the
 fuzzers start with. Each holds the word "zeppelin", in its text or its title.
 
-python3 seeds.py FOLDER: writes them there, as "seed.<extension>".
+python3 seeds.py [--fuzz] FOLDER: writes them there, as "seed.<extension>"; for the fuzzer with a line before them that
+names the reader.
 """
 
 import bz2
@@ -332,10 +333,24 @@ def seeds():
             "txt.bz2": bz2.compress(WORD * 99)}
 
 
+READERS = {"old-office": ("doc", "xls", "ppt", "msg"), "rich-text": ("rtf",), "office": ("docx", "xlsx", "pptx"),
+           "open-document": ("odt",), "book": ("epub",), "mail": ("eml", "mbox"), "plain": ("txt", "csv"), "html": ("html",),
+           "archive": ("zip", "tar", "tar.gz", "txt.xz", "txt.bz2"), "xml": ("xml", "svg"), "unknown": ("txt", "pdf"),
+           "audio": ("mp3", "flac", "wav", "aiff", "dsf", "ape", "m4a"), "xmp": ("xmp",),
+           "pdf": ("pdf",), "photo": ("png", "tif", "jpg", "webp"), "video": ("mp4", "mkv")}
+PACKET = b"<rdf:RDF><dc:title><rdf:Alt><rdf:li>zeppelin</rdf:li></rdf:Alt></dc:title></rdf:RDF>"
+
+
 def main():
-    os.makedirs(sys.argv[1], exist_ok=True)
-    for extension, content in seeds().items():
-        with open(os.path.join(sys.argv[1], "seed." + extension), "wb") as file:
+    folder = sys.argv[-1]
+    os.makedirs(folder, exist_ok=True)
+    files = seeds()
+    if "--fuzz" in sys.argv:
+        files["xmp"] = PACKET
+        files = {f"{reader}.{extension}": reader.encode() + b"\n" + files[extension]
+                 for reader, extensions in READERS.items() for extension in extensions}
+    for name, content in files.items():
+        with open(os.path.join(folder, "seed." + name), "wb") as file:
             file.write(content)
 
 
