@@ -35,9 +35,12 @@ AS_THEY_ARE = [
 ]
 # What exiftool does not say, or says of another part of the file: ffprobe does.
 CORRECTED = {
-    "3gp.3gp": {"KOVAMDAudioChannelCount": 1}, "no-tags.3g2": {"KOVAMDDurationSecond": tools.near(16.3, 0.05), "KOVAMDAudioChannelCount": 1},
-    "asf.asf": {"KOVAMDDurationSecond": tools.near(4.4, 0.05)}, "ogg.ogv": {"KOVAMDDurationSecond": None},
-    "DV.dv": {"KOVAMDDurationSecond": None, "KOVAMDAudioChannelCount": None}, "MXF.mxf": {"KOVAMDAudioSampleRate": None},
+    "3gp.3gp": {"KOVAMDAudioChannelCount": 1},
+    "no-tags.3g2": {"KOVAMDDurationSecond": tools.near(16.3, 0.05), "KOVAMDAudioChannelCount": 1},
+    "asf.asf": {"KOVAMDDurationSecond": tools.near(4.4, 0.05)},
+    "ogg.ogv": {"KOVAMDDurationSecond": None},
+    "DV.dv": {"KOVAMDDurationSecond": None, "KOVAMDAudioChannelCount": None},
+    "MXF.mxf": {"KOVAMDAudioSampleRate": None},
     "RIFF.avi": {"KOVAMDContentCreationDate": tools.seconds_of("2003:03:10 15:04:43")},
     "Pentax.avi": {"KOVAMDContentCreationDate": tools.seconds_of("2009:10:27 12:14:34")},
     "Real.rm": {"KOVAMDTitle": "A title", "KOVAMDDurationSecond": None},
@@ -67,7 +70,8 @@ def add_as_they_are(corpus):
     paths = [donor(corpus, package, name) for package, name, _, _ in AS_THEY_ARE]
     said = tools.examine(corpus, paths)
     for path, (package, name, extension, mime) in zip(paths, AS_THEY_ARE):
-        corpus.add(f"{extension}/of_{package.split('-')[0]}_{name}", path, fields=fields_of(said[path], name), mime=mime)
+        target = f"{extension}/of_{package.split('-')[0]}_{name}"
+        corpus.add(target, path, fields=fields_of(said[path], name), mime=mime)
 
 
 def add_by_mutagen(corpus, work):
@@ -119,7 +123,7 @@ def with_matroska_tags(film, texts):
     rest = 9 + size - len(made)
     if rest < 9:
         raise ValueError(f"{len(made)} bytes of tags have no place in a gap of {size}")
-    return film[:gap] + made + b"\xec" + (1 << 56 | rest - 9).to_bytes(8, "big") + bytes(rest - 9) + film[gap + 9 + size:]
+    return film[:gap] + made + element(b"\xec", bytes(rest - 9)) + film[gap + 9 + size:]
 
 
 def add_matroska(corpus):
@@ -160,20 +164,20 @@ def add_flash_and_avi(corpus):
         corpus.add(f"flv/{language}.flv", with_flash_texts(flash, texts), [texts[1].split()[0]], {
             "KOVAMDTitle": texts[0], "KOVAMDMusicalGenre": texts[2], "KOVAMDComment": texts[3]})
         corpus.add(f"avi/{language}.avi", with_avi_texts(avi, texts), [texts[1].split()[0]], {
-            "KOVAMDTitle": texts[0], "KOVAMDMusicalGenre": texts[2], "KOVAMDComment": texts[3], "KOVAMDPixelWidth": 320})
+            "KOVAMDTitle": texts[0], "KOVAMDMusicalGenre": texts[2], "KOVAMDComment": texts[3],
+            "KOVAMDPixelWidth": 320})
 
 
 def add_broadcasts(corpus):
     for width, height, seconds in ((352, 288, 3), (720, 576, 2), (1280, 720, 1)):
-        fields = {"KOVAMDPixelWidth": width, "KOVAMDPixelHeight": height, "KOVAMDDurationSecond": tools.near(seconds, 0.05),
-                  "KOVAMDCodecs": "MPEG Video"}
+        fields = {"KOVAMDPixelWidth": width, "KOVAMDPixelHeight": height, "KOVAMDCodecs": "MPEG Video",
+                  "KOVAMDDurationSecond": tools.near(seconds, 0.05)}
         program = gray_film.program_stream(width, height, seconds)
         corpus.add(f"mpg/of_{seconds}_seconds.mpg", program, fields=fields, mime="video/mpeg")
         corpus.add(f"mpg/of_{seconds}_seconds.vob", program, fields=fields, mime="video/mpeg")
-        corpus.add(f"ts/of_{seconds}_seconds.ts", gray_film.transport_stream(width, height, seconds), fields=fields,
-                   mime="video/mp2t")
-        corpus.add(f"ts/of_{seconds}_seconds.m2ts", gray_film.transport_stream(width, height, seconds, True), fields=fields,
-                   mime="video/mp2t")
+        for extension, times in (("ts", False), ("m2ts", True)):
+            packets = gray_film.transport_stream(width, height, seconds, times)
+            corpus.add(f"ts/of_{seconds}_seconds.{extension}", packets, fields=fields, mime="video/mp2t")
     corpus.add("ts/no_film.ts", b"export const answer: number = 42; // in TypeScript\n", ["TypeScript"])
 
 

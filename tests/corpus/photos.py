@@ -1,10 +1,12 @@
 """Pictures: what cameras, and then people, put into them.
 
-Of files as cameras and programs made them, exiftool says what must be found; to others it adds texts in several languages.
+Of files as cameras and programs made them, exiftool says what must be found; to others it adds texts in several
+languages.
 """
 
 import struct
 import tempfile
+import zlib
 
 import tools
 
@@ -43,13 +45,16 @@ PLAIN = [
 
 # Of a language: title, description, keywords, author, city, country, people.
 TEXTS = {
-    "russian": ("Закат над Волгой", "Вид с набережной", ["река", "вечер"], "Иван Шишкин", "Казань", "Россия", "Мария"),
+    "russian": ("Закат над Волгой", "Вид с набережной", ["река", "вечер"],
+                "Иван Шишкин", "Казань", "Россия", "Мария"),
     "japanese": ("桜の公園", "春の散歩道", ["花見", "公園"], "山田太郎", "京都", "日本", "花子"),
-    "greek": ("Ηλιοβασίλεμα", "Το λιμάνι το βράδυ", ["θάλασσα", "λιμάνι"], "Ελένη Παππά", "Χανιά", "Ελλάδα", "Νίκος"),
+    "greek": ("Ηλιοβασίλεμα", "Το λιμάνι το βράδυ", ["θάλασσα", "λιμάνι"],
+              "Ελένη Παππά", "Χανιά", "Ελλάδα", "Νίκος"),
 }
 BASES = {
     "jpg": (GO_IMAGE, "go-turns-two-280x360.jpeg"), "tif": (GO_IMAGE, "video-001.tiff"),
-    "png": (GO_IMAGE, "go-turns-two-down-nn.png"), "avif": (MIMETYPE, "avif.avif"), "psd": (MIMETYPE, "psd.psd"), "heic": None, "dng": None, "nef": None, "gif": None,
+    "png": (GO_IMAGE, "go-turns-two-down-nn.png"), "avif": (MIMETYPE, "avif.avif"),
+    "psd": (MIMETYPE, "psd.psd"), "heic": None, "dng": None, "nef": None, "gif": None,
     "jp2": None,
 }
 
@@ -64,7 +69,8 @@ def fields_of(said, extension):
     for tag, field in (("Make", "AcquisitionMake"), ("Model", "AcquisitionModel")):
         if str(said.get(tag, "")).strip():
             fields["KOVAMD" + field] = str(said[tag]).strip()
-    for tag, field in (("FNumber", "FNumber"), ("ExposureTime", "ExposureTimeSeconds"), ("FocalLength", "FocalLength")):
+    numbers = (("FNumber", "FNumber"), ("ExposureTime", "ExposureTimeSeconds"), ("FocalLength", "FocalLength"))
+    for tag, field in numbers:
         if isinstance(said.get(tag), (int, float)) and said[tag] > 0 and extension != "crw":
             fields["KOVAMD" + field] = tools.near(said[tag])
     if isinstance(said.get("ISO"), int) and said["ISO"] > 10 and extension != "crw":
@@ -104,7 +110,8 @@ def base(corpus, extension):
         return donor(corpus, *BASES[extension])
     if extension == "heic":
         return corpus.source_donor("libheif", "examples/example.heic")
-    return tools.sample(corpus, {"dng": "DNG.dng", "nef": "Nikon.nef", "gif": "GIF.gif", "jp2": "Jpeg2000.jp2"}[extension])
+    names = {"dng": "DNG.dng", "nef": "Nikon.nef", "gif": "GIF.gif", "jp2": "Jpeg2000.jp2"}
+    return tools.sample(corpus, names[extension])
 
 
 def webp(picture, width, height, xmp):
@@ -128,9 +135,10 @@ def add_webp_with_texts(corpus):
             tools.exiftool(corpus, [*tags, "-XMP-tiff:Model=K 200", "-o", f"{work}/{language}.xmp"])
             with open(f"{work}/{language}.xmp", "rb") as file:
                 packet = file.read()
-            corpus.add(f"webp/{language}.webp", webp(picture, said["ImageWidth"], said["ImageHeight"], packet), texts[2],
-                       {"KOVAMDTitle": texts[0], "KOVAMDCity": texts[4], "KOVAMDAcquisitionModel": "K 200",
-                        "KOVAMDPixelWidth": said["ImageWidth"], "KOVAMDPixelHeight": said["ImageHeight"]})
+            width, height = said["ImageWidth"], said["ImageHeight"]
+            corpus.add(f"webp/{language}.webp", webp(picture, width, height, packet), texts[2], {
+                "KOVAMDTitle": texts[0], "KOVAMDCity": texts[4], "KOVAMDAcquisitionModel": "K 200",
+                "KOVAMDPixelWidth": width, "KOVAMDPixelHeight": height})
 
 
 def add_with_texts(corpus):
@@ -139,7 +147,8 @@ def add_with_texts(corpus):
                 for extension in BASES for language, texts in TEXTS.items()]
         tools.write_tags(corpus, jobs)
         for extension in BASES:
-            for language, (title, description, keywords, author, city, country, person) in TEXTS.items():
+            for language, texts in TEXTS.items():
+                title, description, keywords, author, city, country, person = texts
                 fields = {"KOVAMDTitle": title, "KOVAMDDescription": description, "KOVAMDCity": city,
                           "KOVAMDCountry": country, "KOVAMDPeopleDisplayName": person}
                 if extension not in ("gif", "nef"):  # no EXIF in the one; the other keeps what it has of the camera
@@ -150,7 +159,7 @@ def add_with_texts(corpus):
 
 
 def add_older_texts(corpus):
-    """Texts outside of XMP: IPTC, with and without a mark for UTF-8, comments, Windows' own, names in raw code pages."""
+    """Texts outside of XMP: IPTC, with and without a mark for UTF-8, comments, Windows' own, raw code pages."""
     jpeg = base(corpus, "jpg")
     with tempfile.TemporaryDirectory() as work:
         def written(name, *tags):
@@ -159,7 +168,8 @@ def add_older_texts(corpus):
         corpus.add("jpg/iptc.jpg", written("iptc.jpg", "-IPTC:ObjectName=Mořské pobřeží", "-IPTC:City=Plzeň",
                                            "-IPTC:Keywords=léto", "-IPTC:Caption-Abstract=Dovolená u moře",
                                            "-IPTC:Country-PrimaryLocationName=Česko", "-IPTC:Sub-location=Doudlevce"),
-                   ["léto", "moře"], {"KOVAMDTitle": "Mořské pobřeží", "KOVAMDNamedLocation": "Doudlevce, Plzeň, Česko"})
+                   ["léto", "moře"],
+                   {"KOVAMDTitle": "Mořské pobřeží", "KOVAMDNamedLocation": "Doudlevce, Plzeň, Česko"})
         corpus.add("jpg/windows.jpg", written("windows.jpg", "-EXIF:XPTitle=Ausflug zum Königssee",
                                               "-EXIF:XPKeywords=Gebirge;Schiff", "-EXIF:XPComment=schönes Wetter"),
                    ["Gebirge", "Schiff"], {"KOVAMDTitle": "Ausflug zum Königssee", "KOVAMDComment": "schönes Wetter"})
@@ -186,9 +196,22 @@ def gif(width, height, comment, pictures=3):
             bits |= code << count
             count += 3
     bits |= 5 << count
-    picture = b"," + struct.pack("<HHHHB", 0, 0, width, height, 0) + b"\2" + pieces(bits.to_bytes(count // 8 + 1, "little"))
+    picture = b"," + struct.pack("<HHHHB", 0, 0, width, height, 0) + b"\2"
+    picture += pieces(bits.to_bytes(count // 8 + 1, "little"))
     head = b"GIF89a" + struct.pack("<HHBBB", width, height, 0x91, 0, 0) + bytes(range(12))
     return head + (b"!\xf9\4\0\x0a\0\0\0" + picture) * pictures + b"!\xfe" + pieces(comment) + b";"
+
+
+def add_png_texts(corpus):
+    """Texts of its own kinds, before and behind the picture."""
+    def chunk(name, data):
+        return struct.pack(">I", len(data)) + name + data + struct.pack(">I", zlib.crc32(name + data))
+    with open(base(corpus, "png"), "rb") as file:
+        png = file.read()
+    early = chunk(b"tEXt", b"Software\0Ritprogram") + chunk(b"tEXt", "Author\0Åsa Öberg".encode("latin-1"))
+    late = chunk(b"iTXt", b"Title\0\0\0sv\0\0" + "Tåget i fjällen".encode())
+    corpus.add("png/texts.png", png[:33] + early + png[33:-12] + late + png[-12:], ["fjällen"], {
+        "KOVAMDTitle": "Tåget i fjällen", "KOVAMDAuthors": "Åsa Öberg", "KOVAMDCreator": "Ritprogram"})
 
 
 def add_drawings(corpus):
@@ -200,8 +223,8 @@ def add_drawings(corpus):
     corpus.add("svg/floor.svg", drawing.encode(), ["Переговорная", "кухня", "Лестница"], {"KOVAMDTitle": "План этажа"},
                mime="image/svg+xml")
     corpus.add("svg/report.svg", tools.sample(corpus, "XMP.svg"), ["widget", "growth"], mime="image/svg+xml")
-    corpus.add("svg/badge.svg", b'<svg xmlns="http://www.w3.org/2000/svg"><text>coverage <tspan>gedeckt</tspan></text></svg>',
-               ["gedeckt"], mime="image/svg+xml")
+    badge = b'<svg xmlns="http://www.w3.org/2000/svg"><text>coverage <tspan>gedeckt</tspan></text></svg>'
+    corpus.add("svg/badge.svg", badge, ["gedeckt"], mime="image/svg+xml")
     corpus.add("xmp/beside_a_picture.xmp", tools.sample(corpus, "XMP6.xmp"), ["title"], mime="application/rdf+xml")
     corpus.add("xmp/canon.xmp", tools.sample(corpus, "XMP.xmp"), ["test1"], mime="application/rdf+xml")
 
@@ -211,4 +234,5 @@ def make(corpus):
     add_with_texts(corpus)
     add_webp_with_texts(corpus)
     add_older_texts(corpus)
+    add_png_texts(corpus)
     add_drawings(corpus)

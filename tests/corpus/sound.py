@@ -107,8 +107,8 @@ def add_with_tags(corpus, work):
             shutil.copyfile(donor(corpus, name), path)
             write_tags(corpus, path, how, texts)
             numbers = {} if name in NO_NUMBERS else numbers_of(corpus, path)
-            corpus.add(f"{extension}/{language}.{extension}", path, [texts[1].split()[-1]], dict(numbers, **expected(texts)),
-                       mime=mime)
+            corpus.add(f"{extension}/{language}.{extension}", path, [texts[1].split()[-1]],
+                       dict(numbers, **expected(texts)), mime=mime)
 
 
 def id3_1(texts, code_page):
@@ -200,8 +200,9 @@ def add_made_here(corpus, work):
         named = {"KOVAMDTitle": title, "KOVAMDAuthors": artist}
         lines = f"title={title}\nartist={artist}\nalbum={album}\ntrack=7"
         corpus.add(f"au/{language}.au", au(lines), [album], dict(numbers, **named), mime="audio/basic")
-        corpus.add(f"caf/{language}.caf", caf([("title", title), ("artist", artist), ("comments", comment)]), fields=dict(
-            numbers, KOVAMDComment=comment, **named), mime="audio/x-caf")
+        texts = [("title", title), ("artist", artist), ("comments", comment)]
+        corpus.add(f"caf/{language}.caf", caf(texts), fields=dict(numbers, KOVAMDComment=comment, **named),
+                   mime="audio/x-caf")
         corpus.add(f"aiff/chunks_{language}.aiff", aiff([(b"NAME", title), (b"AUTH", artist), (b"ANNO", comment)]),
                    fields=dict(numbers, KOVAMDComment=comment, **named), mime=AIFF)
         info = [(b"INAM", title), (b"IART", artist), (b"IGNR", genre), (b"ICMT", comment), (b"ICOP", composer)]

@@ -29,8 +29,8 @@ def source_entries(suite):
             lines += [re.sub(r"^deb ", "deb-src ", line) for line in text.splitlines()
                       if re.match(rf"deb .*\s{suite}\s.*\bmain\b", line)]
         else:
-            stanzas += [re.sub(r"(?m)^Suites:.*", f"Suites: {suite}", re.sub(r"(?m)^Types:.*", "Types: deb-src", stanza))
-                        for stanza in re.split(r"\n\s*\n", text)
+            text = re.sub(r"(?m)^Types:.*", "Types: deb-src", text)
+            stanzas += [re.sub(r"(?m)^Suites:.*", f"Suites: {suite}", stanza) for stanza in re.split(r"\n\s*\n", text)
                         if re.search(rf"(?m)^Suites:.*\s{suite}(\s|$)", stanza)]
     return "\n".join(lines), "\n\n".join(stanzas)
 

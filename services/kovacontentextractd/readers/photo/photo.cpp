@@ -10,6 +10,7 @@
 #include "services/kovacontentextractd/readers/mapped_file.h"
 #include "services/kovacontentextractd/readers/photo/gif.h"
 #include "services/kovacontentextractd/readers/photo/heif.h"
+#include "services/kovacontentextractd/readers/photo/png.h"
 #include "services/kovacontentextractd/readers/times.h"
 
 namespace ferrox::extract {
@@ -278,15 +279,15 @@ void AddPlace(const Fields& fields, Findings& findings) {
   findings.Set("KOVAMDNamedLocation", place);
 }
 
-void AddGifTexts(const MappedFile& file, Exiv2::Image& image, Fields& fields) {
-  const GifTexts texts = ReadGifTexts({reinterpret_cast<const char*>(file.Data()), file.Size()});
+void AddGifTexts(std::string_view file, Exiv2::Image& image, Fields& fields) {
+  const GifTexts texts = ReadGifTexts(file);
   if (!texts.xmp.empty()) (void)Exiv2::XmpParser::decode(image.xmpData(), texts.xmp);
   fields.Add("KOVAMDComment", texts.comment);
 }
 
 /// The library finds these parts in some HEIF files only.
-void AddHeifParts(const MappedFile& file, Exiv2::Image& image) {
-  const HeifParts parts = ReadHeifParts({reinterpret_cast<const char*>(file.Data()), file.Size()});
+void AddHeifParts(std::string_view file, Exiv2::Image& image) {
+  const HeifParts parts = ReadHeifParts(file);
   if (!parts.exif.empty() && image.exifData().empty()) {
     (void)Exiv2::ExifParser::decode(image.exifData(), reinterpret_cast<const Exiv2::byte*>(parts.exif.data()),
                                     static_cast<uint32_t>(parts.exif.size()));
@@ -294,8 +295,23 @@ void AddHeifParts(const MappedFile& file, Exiv2::Image& image) {
   if (!parts.xmp.empty() && image.xmpData().empty()) (void)Exiv2::XmpParser::decode(image.xmpData(), parts.xmp);
 }
 
-void ReadImage(const MappedFile& file, Findings& findings) {
-  const auto image = Exiv2::ImageFactory::open(file.Data(), static_cast<long>(file.Size()));
+void AddPngTexts(const PngParts& parts, Fields& fields) {
+  static constexpr std::pair<std::string_view, const char*> kKeywords[] = {
+      {"Title", "KOVAMDTitle"},      {"Author", "KOVAMDAuthors"},       {"Description", "KOVAMDDescription"},
+      {"Comment", "KOVAMDComment"},  {"parameters", "KOVAMDComment"},   {"Copyright", "KOVAMDCopyright"},
+      {"Software", "KOVAMDCreator"}, {"Make", "KOVAMDAcquisitionMake"}, {"Model", "KOVAMDAcquisitionModel"},
+  };
+  for (const auto& [keyword, text] : parts.texts) {
+    for (const auto& [known, field] : kKeywords) {
+      if (keyword == known) fields.Add(field, text);
+    }
+  }
+}
+
+/// `png` is what the file has beside its picture, where it is a PNG file.
+void ReadImage(std::string_view file, const PngParts& png, Findings& findings) {
+  const auto* data = reinterpret_cast<const Exiv2::byte*>(file.data());
+  const auto image = Exiv2::ImageFactory::open(data, static_cast<long>(file.size()));
   try {
     image->readMetadata();
   } catch (const Exiv2::AnyError&) {
@@ -311,6 +327,7 @@ void ReadImage(const MappedFile& file, Findings& findings) {
   AddRows<Exiv2::IptcData, Exiv2::IptcKey>(image->iptcData(), kIptcRows, fields);
   AddExif(image->exifData(), fields, findings);
   AddRows<Exiv2::XmpData, Exiv2::XmpKey>(image->xmpData(), kCopiedRows, fields);
+  AddPngTexts(png, fields);
   fields.Add("KOVAMDComment", image->comment());
   AddTimes(*image, findings);
   AddExposure(image->exifData(), findings);
@@ -328,14 +345,18 @@ void PreparePhoto() {
 
 void ReadPhoto(const Source& source, Findings& findings) {
   PreparePhoto();
-  const MappedFile file(source);
-  if (file.Data() == nullptr) return findings.Fail("damaged");
+  const char* problem = "damaged";
   try {
-    ReadImage(file, findings);
+    const PngParts png = ReadPngParts(source);
+    if (!png.file.empty()) return ReadImage(png.file, png, findings);
+    const MappedFile file(source);
+    if (!file.IsWhole()) problem = "too large";  // when that was not enough of it
+    if (file.Data() == nullptr) return findings.Fail(problem);
+    ReadImage({reinterpret_cast<const char*>(file.Data()), file.Size()}, png, findings);
   } catch (const std::bad_alloc&) {
     findings.Fail("needs too much memory");
   } catch (const std::exception&) {
-    findings.Fail("damaged");
+    findings.Fail(problem);
   }
 }
 
