@@ -130,6 +130,14 @@ TEST(OfficeOpenTest, TextDocument) {
   EXPECT_FALSE(document.isMember("_KOVAExtractError"));
 }
 
+TEST(OfficeOpenTest, NamesOfMembersAsWindowsWritesThem) {
+  const std::string document = MakeZip({{"_rels\\.rels",
+                                         "<Relationships><Relationship Id='a' Type='x/officeDocument' "
+                                         "Target='word/Document.xml'/></Relationships>"},
+                                        {"word\\document.xml", "<w:p><w:t>found</w:t></w:p>"}});
+  EXPECT_EQ("found\n", Text(Read(&ReadOfficeOpen, document, "docx")));
+}
+
 TEST(OfficeOpenTest, WorkbookShowsNumbersAndDatesAsPeopleSeeThem) {
   EXPECT_EQ("Umsätze\nBerlin\n東京\n0.3\t2024-03-01\t2024-03-01 12:00\t2 2.00\t\ninline\tmade\t\n",
             Text(Read(&ReadOfficeOpen, WorkbookSample(), "xlsx")));

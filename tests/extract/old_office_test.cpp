@@ -187,6 +187,19 @@ TEST(OldOfficeTest, WordTextInPieces) {
   EXPECT_EQ(1709294400, document["KOVAMDContentCreationDate"].asInt64());
 }
 
+TEST(OldOfficeTest, WordBefore97InTheEncodingOfItsCountry) {
+  const auto word95 = [](uint64_t flags, const std::string& text) {
+    std::string document = Little(0xA5DC, 2) + Little(0x68, 2) + Little(0, 6) + Little(flags, 2) + Little(0, 12) +
+                           Little(0x300, 4) + Little(0x300 + text.size(), 4);
+    document.resize(0x300);
+    return CompoundBuilder({{"WORDDOCUMENT", document + text},
+                            {"\005SummaryInformation", PropertySet({{1, Little(2, 4) + Little(1251, 2)}})}})
+        .Bytes();
+  };
+  EXPECT_EQ("Вина\n", Text(Read(&ReadOldOffice, word95(0, "\xC2\xE8\xED\xE0\r"), "doc")));
+  EXPECT_EQ("東京\n", Text(Read(&ReadOldOffice, word95(0x1000, Utf16(u"東京\r")), "doc"))) << "of East Asia";
+}
+
 TEST(OldOfficeTest, ExcelTextsAndNumbers) {
   EXPECT_EQ("Umsätze\nBerlin\nab東京都市\n12.5\t2024-03-01\t\n12.34\t\n7\t8\t\nёж\t",
             Text(Read(&ReadOldOffice, ExcelSample(), "xls")));
@@ -197,7 +210,9 @@ TEST(OldOfficeTest, PowerPointTextWithoutItsMasters) {
 }
 
 TEST(OldOfficeTest, OutlookMessage) {
-  const std::string message = CompoundBuilder({{"__properties_version1.0", "x"},
+  const std::string sent =
+      Little(0x00390040, 4) + Little(6, 4) + Little((1709294400ULL + 11644473600ULL) * 10000000, 8);
+  const std::string message = CompoundBuilder({{"__properties_version1.0", std::string(32, '\0') + sent},
                                                {"__substg1.0_0037001F", Utf16(u"Привет")},
                                                {"__substg1.0_0C1A001F", Utf16(u"Anna")},
                                                {"__substg1.0_1000001F", Utf16(u"Text\r\n")}})
@@ -206,6 +221,7 @@ TEST(OldOfficeTest, OutlookMessage) {
   EXPECT_EQ("Привет", Text(document, "KOVAMDTitle"));
   EXPECT_EQ("Anna", Text(document, "KOVAMDAuthors"));
   EXPECT_EQ("Text\r\n", Text(document));
+  EXPECT_EQ(1709294400, document["KOVAMDContentCreationDate"].asInt64());
 }
 
 TEST(OldOfficeTest, CyclesAndDamageAreBorne) {

@@ -14,6 +14,12 @@ constexpr size_t kHeaderBytes = 512;
 constexpr uint32_t kLastSector = 0xFFFFFFFA;  ///< numbers beyond it have other meanings: end, free
 constexpr size_t kEntryBytes = 128;
 constexpr uint8_t kStorageType = 1, kStreamType = 2;
+
+/// Some programs write all names in capitals.
+bool IsSameName(std::string_view a, std::string_view b) {
+  const auto lower = [](char c) { return c >= 'A' && c <= 'Z' ? static_cast<char>(c - 'A' + 'a') : c; };
+  return std::equal(a.begin(), a.end(), b.begin(), b.end(), [&](char x, char y) { return lower(x) == lower(y); });
+}
 constexpr size_t kEntriesMax = 65536;
 constexpr uint64_t kTableMax = 8U << 20;  ///< sectors: a file of 4 GiB
 constexpr uint64_t kStreamMaxBytes = 128U << 20;
@@ -179,7 +185,7 @@ std::vector<uint32_t> CompoundFile::Storages(std::string_view begin) const {
 
 std::unique_ptr<CompoundStream> CompoundFile::Open(std::string_view name, uint32_t storage) const {
   const auto found = std::find_if(entries_.begin(), entries_.end(), [&](const Entry& entry) {
-    return entry.type == kStreamType && entry.parent == storage && entry.name == name;
+    return entry.type == kStreamType && entry.parent == storage && IsSameName(entry.name, name);
   });
   if (found == entries_.end()) return nullptr;
   auto stream = std::make_unique<CompoundStream>();

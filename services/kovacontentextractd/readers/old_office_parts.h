@@ -7,6 +7,8 @@ namespace ferrox::extract {
 
 /// Title, authors and the like from the file's property sets.
 void AddSummaryInformation(const CompoundFile& file, Findings& findings);
+/// In which those properties are written.
+int SummaryCodePage(const CompoundFile& file);
 
 void ReadOldWord(const CompoundFile& file, Findings& findings);
 /// `book` is the stream with the workbook.

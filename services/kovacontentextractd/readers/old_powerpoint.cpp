@@ -1,5 +1,6 @@
 #include <algorithm>
 #include <string>
+#include <vector>
 
 #include "services/kovacontentextractd/readers/code_pages.h"
 #include "services/kovacontentextractd/readers/little_endian.h"
@@ -96,7 +97,10 @@ class SlideReader {
 
 void ReadOldPowerPoint(const CompoundFile& file, Findings& findings) {
   if (IsEncrypted(file)) return findings.Fail("encrypted");
-  const auto stream = file.Open("PowerPoint Document");
+  // Saved for two versions of the program: what the newer one reads has a storage of its own.
+  const std::vector<uint32_t> newer = file.Storages("PP97_DUALSTORAGE");
+  auto stream = newer.empty() ? nullptr : file.Open("PowerPoint Document", newer.front());
+  if (stream == nullptr) stream = file.Open("PowerPoint Document");
   (void)SlideReader(*stream, findings).Read(stream->Size());
 }
 

@@ -15,7 +15,6 @@ constexpr size_t kPieceBytes = 32U << 10;
 constexpr uint32_t kPieceTableMax = 8U << 20;
 /// Of all pieces: they may overlap, and hold nothing.
 constexpr uint64_t kCharactersMaxBytes = 64U << 20;
-constexpr uint16_t kWord97 = 0x00C1;
 
 /// Makes text of Word's characters: marks of paragraphs and cells, and fields, whose instructions are left out.
 class WordText {
@@ -43,6 +42,12 @@ class WordText {
     return text_.size() < kPieceBytes || Flush();
   }
 
+  /// What has no marks in it.
+  bool AddPlain(std::string_view utf8) {
+    if (instructions_ == 0) text_ += utf8;
+    return text_.size() < kPieceBytes || Flush();
+  }
+
   bool Flush() {
     const bool more = findings_.AddText(text_);
     text_.clear();
@@ -55,39 +60,78 @@ class WordText {
   int instructions_ = 0;  ///< fields whose instructions we are in
 };
 
+/// Adds text in the encoding of its country, as it was before Word 97. Characters below the blank are marks.
+bool AddEncoded(std::string_view bytes, int code_page, WordText& text) {
+  while (!bytes.empty()) {
+    const auto is_mark = [](char c) { return static_cast<unsigned char>(c) < ' '; };
+    const auto length = static_cast<size_t>(std::find_if(bytes.begin(), bytes.end(), is_mark) - bytes.begin());
+    if (length > 0 && !text.AddPlain(FromCodePage(bytes.substr(0, length), code_page))) return false;
+    if (length < bytes.size() && !text.Add(static_cast<unsigned char>(bytes[length]))) return false;
+    bytes.remove_prefix(std::min(length + 1, bytes.size()));
+  }
+  return true;
+}
+
 /// Adds `size` bytes of text at `offset`, of one or two bytes a character.
-bool AddPiece(const CompoundStream& document, uint64_t offset, uint64_t size, bool wide, WordText& text) {
+bool AddPiece(const CompoundStream& document, uint64_t offset, uint64_t size, bool wide, int code_page,
+              WordText& text) {
   const uint64_t end = std::min(offset + size, document.Size());
   while (offset < end) {
     const std::string bytes =
         document.ReadAt(offset, static_cast<size_t>(std::min<uint64_t>(kPieceBytes, end - offset)));
     if (bytes.empty()) return true;
-    for (size_t i = 0; i + (wide ? 2 : 1) <= bytes.size(); i += wide ? 2 : 1) {
-      uint32_t code = wide ? Little16(bytes, i) : FromWindows1252(static_cast<unsigned char>(bytes[i]));
-      if (wide && code >= 0xD800 && code <= 0xDBFF && (Little16(bytes, i + 2) & 0xFC00) == 0xDC00) {
+    offset += bytes.size();
+    if (!wide) {
+      if (!AddEncoded(bytes, code_page, text)) return false;
+      continue;
+    }
+    for (size_t i = 0; i + 2 <= bytes.size(); i += 2) {
+      uint32_t code = Little16(bytes, i);
+      if (code >= 0xD800 && code <= 0xDBFF && (Little16(bytes, i + 2) & 0xFC00) == 0xDC00) {
         code = 0x10000 + ((code & 0x3FF) << 10) + (Little16(bytes, i + 2) & 0x3FFU);
         i += 2;
       }
       if (!text.Add(code)) return false;
     }
-    offset += bytes.size();
   }
   return true;
 }
 
+/// How a document has its characters.
+struct Form {
+  bool is_97 = true;     ///< Word 97 or later, where each piece tells how wide its characters are
+  bool wide = true;      ///< two bytes a character
+  int code_page = 1252;  ///< of narrow ones
+};
+
+/// Before Word 97 the narrow characters are those of the writer's country; where that is in East Asia, they are wide.
+Form FormOf(const CompoundFile& file, const std::string& header) {
+  constexpr uint16_t kWord97 = 0x00C1, kExtendedCharacters = 0x1000;
+  if (Little16(header, 2) >= kWord97) return {};
+  return {false, (Little16(header, 0x0A) & kExtendedCharacters) != 0, SummaryCodePage(file)};
+}
+
 /// The table of the pieces that the text is made of, behind a list of changes to formats.
-std::string PieceTable(const CompoundFile& file, const std::string& header) {
-  const bool one = (Little16(header, 0x0A) & 0x0200) != 0;
-  const auto stream = file.Open(one ? "1Table" : "0Table");
-  if (stream == nullptr) return {};
-  const uint32_t size = std::min(Little32(header, 0x1A6), kPieceTableMax);
-  const std::string clx = stream->ReadAt(Little32(header, 0x1A2), size);
+std::string PieceTable(const CompoundStream& stream, uint32_t offset, uint32_t size) {
+  const std::string clx = stream.ReadAt(offset, std::min(size, kPieceTableMax));
   size_t at = 0;
   while (at + 3 <= clx.size() && clx[at] == 1) at += 3 + size_t{Little16(clx, at + 1)};
   return at + 5 <= clx.size() && clx[at] == 2 ? clx.substr(at + 5, Little32(clx, at + 1)) : std::string();
 }
 
-void AddPieces(const CompoundStream& document, const std::string& table, Findings& findings) {
+std::string PieceTable97(const CompoundFile& file, const std::string& header) {
+  const bool one = (Little16(header, 0x0A) & 0x0200) != 0;
+  const auto stream = file.Open(one ? "1Table" : "0Table");
+  return stream != nullptr ? PieceTable(*stream, Little32(header, 0x1A2), Little32(header, 0x1A6)) : std::string();
+}
+
+/// Before Word 97 only a text that was saved fast is in pieces.
+std::string PieceTable95(const CompoundStream& document, const std::string& header) {
+  const bool saved_fast = (Little16(header, 0x0A) & 0x0004) != 0;
+  return saved_fast ? PieceTable(document, Little32(header, 0x160), Little32(header, 0x164)) : std::string();
+}
+
+void AddPieces(const CompoundStream& document, const std::string& table, const Form& form, Findings& findings) {
   constexpr size_t kPositionBytes = 4, kDescriptorBytes = 8;
   constexpr uint32_t kNarrow = 0x40000000;
   const size_t count =
@@ -98,12 +142,13 @@ void AddPieces(const CompoundStream& document, const std::string& table, Finding
     const uint32_t begin = Little32(table, i * kPositionBytes), end = Little32(table, (i + 1) * kPositionBytes);
     const uint32_t place = Little32(table, (count + 1) * kPositionBytes + i * kDescriptorBytes + 2);
     if (end <= begin) continue;
-    const bool wide = (place & kNarrow) == 0;
-    const uint64_t offset = wide ? place : (place & ~kNarrow) / 2;
+    const bool is_narrow = form.is_97 && (place & kNarrow) != 0;
+    const bool wide = form.wide && !is_narrow;
+    const uint64_t offset = is_narrow ? (place & ~kNarrow) / 2 : place;
     const uint64_t left = document.Size() - std::min(offset, document.Size());
     const uint64_t size = std::min({uint64_t{end - begin} * (wide ? 2 : 1), left, kCharactersMaxBytes - read});
     read += size;
-    if (!AddPiece(document, offset, size, wide, text)) return;
+    if (!AddPiece(document, offset, size, wide, form.code_page, text)) return;
   }
 }
 
@@ -114,13 +159,14 @@ void ReadOldWord(const CompoundFile& file, Findings& findings) {
   const std::string header = document->ReadAt(0, kHeaderBytes);
   if (header.size() < 0x20) return findings.Fail("damaged");
   if ((Little16(header, 0x0A) & 0x0100) != 0) return findings.Fail("encrypted");
-  const std::string table = Little16(header, 2) >= kWord97 ? PieceTable(file, header) : std::string();
-  if (!table.empty()) return AddPieces(*document, table, findings);
-  // Before Word 97, and where the table is lost: the text stands in one piece, in the encoding of its country.
+  const Form form = FormOf(file, header);
+  const std::string table = form.is_97 ? PieceTable97(file, header) : PieceTable95(*document, header);
+  if (!table.empty()) return AddPieces(*document, table, form, findings);
+  // Where the table is lost, and without one: the text stands in one piece.
   const uint32_t begin = Little32(header, 0x18), end = Little32(header, 0x1C);
   if (end <= begin) return findings.Fail("damaged");
   WordText text(findings);
-  (void)AddPiece(*document, begin, end - begin, false, text);
+  (void)AddPiece(*document, begin, end - begin, form.wide && !form.is_97, form.code_page, text);
 }
 
 }  // namespace ferrox::extract

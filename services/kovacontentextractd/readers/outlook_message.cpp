@@ -2,8 +2,10 @@
 
 #include "services/kovacontentextractd/readers/code_pages.h"
 #include "services/kovacontentextractd/readers/encoding.h"
+#include "services/kovacontentextractd/readers/little_endian.h"
 #include "services/kovacontentextractd/readers/markup.h"
 #include "services/kovacontentextractd/readers/old_office_parts.h"
+#include "services/kovacontentextractd/readers/times.h"
 
 namespace ferrox::extract {
 
@@ -12,14 +14,46 @@ namespace {
 constexpr size_t kValueMaxBytes = 2U << 20;
 
 /// A property's text by its number: in UTF-16, or in bytes of an encoding that is not told.
-std::string TextOf(const CompoundFile& file, const std::string& number) {
-  if (const auto wide = file.Open("__substg1.0_" + number + "001F")) {
+std::string TextOf(const CompoundFile& file, const std::string& number, uint32_t storage = CompoundFile::kRoot) {
+  if (const auto wide = file.Open("__substg1.0_" + number + "001F", storage)) {
     return FromUtf16Little(wide->ReadAt(0, kValueMaxBytes));
   }
-  const auto narrow = file.Open("__substg1.0_" + number + "001E");
+  const auto narrow = file.Open("__substg1.0_" + number + "001E", storage);
   DecodedText decoded;
   if (narrow != nullptr) (void)Decode(narrow->ReadAt(0, kValueMaxBytes), true, {}, decoded);
   return decoded.text;
+}
+
+/// When the message was sent: one of the properties of fixed size, which are in a table.
+void AddSendTime(const CompoundFile& file, Findings& findings) {
+  constexpr size_t kHeaderBytes = 32, kEntryBytes = 16, kTableMaxBytes = 1U << 20;
+  constexpr uint32_t kSent = 0x00390040;
+  const auto stream = file.Open("__properties_version1.0");
+  const std::string table = stream != nullptr ? stream->ReadAt(0, kTableMaxBytes) : std::string();
+  for (size_t at = kHeaderBytes; at + kEntryBytes <= table.size(); at += kEntryBytes) {
+    if (Little32(table, at) != kSent) continue;
+    if (const auto seconds = FromFileTime(LittleEndian(table, at + 8, 8))) {
+      findings.SetInteger("KOVAMDContentCreationDate", *seconds);
+    }
+  }
+}
+
+void AddRecipientAddresses(const CompoundFile& file, Findings& findings) {
+  for (const uint32_t recipient : file.Storages("__recip_version1.0")) {
+    std::string address = TextOf(file, "39FE", recipient);
+    if (address.empty()) address = TextOf(file, "3003", recipient);
+    if (address.find('@') != std::string::npos) findings.Append("KOVAMDRecipientAddresses", address);
+  }
+}
+
+/// The names of what is attached.
+void AddAttachments(const CompoundFile& file, Findings& findings) {
+  for (const uint32_t attachment : file.Storages("__attach_version1.0")) {
+    std::string name = TextOf(file, "3707", attachment);
+    if (name.empty()) name = TextOf(file, "3704", attachment);
+    findings.Break();
+    (void)findings.AddText(name);
+  }
 }
 
 }  // namespace
@@ -37,6 +71,9 @@ void ReadOutlookMessage(const CompoundFile& file, Findings& findings) {
     body = ReadHtml(decoded.text, findings.Bounds().text_bytes).text;
   }
   (void)findings.AddText(body);
+  AddSendTime(file, findings);
+  AddRecipientAddresses(file, findings);
+  AddAttachments(file, findings);
 }
 
 }  // namespace ferrox::extract

@@ -3,6 +3,7 @@
 #include "services/kovacontentextractd/readers/code_pages.h"
 #include "services/kovacontentextractd/readers/little_endian.h"
 #include "services/kovacontentextractd/readers/old_office_parts.h"
+#include "services/kovacontentextractd/readers/times.h"
 
 namespace ferrox::extract {
 
@@ -52,10 +53,22 @@ void SetValue(std::string_view set, size_t at, int code_page, const char* field,
     const auto number = static_cast<int32_t>(type == kInt16 ? Little16(value, 0) : Little32(value, 0));
     if (number > 0) findings.SetInteger(field, number);
   } else if (type == kFileTime) {
-    constexpr int64_t kTicksPerSecond = 10000000, kSecondsTo1970 = 11644473600;
-    const auto ticks = static_cast<int64_t>(LittleEndian(value, 0, 8) & INT64_MAX);
-    if (ticks > kSecondsTo1970 * kTicksPerSecond) findings.SetInteger(field, ticks / kTicksPerSecond - kSecondsTo1970);
+    if (const auto seconds = FromFileTime(LittleEndian(value, 0, 8))) findings.SetInteger(field, *seconds);
   }
+}
+
+template <typename Take>
+void ForEachProperty(std::string_view set, Take take) {
+  const uint32_t count = std::min(Little32(set, 4), kPropertiesMax);
+  for (uint32_t i = 0; i < count; ++i) take(Little32(set, 8 + i * 8), Little32(set, 12 + i * 8));
+}
+
+int CodePageOf(std::string_view set) {
+  int code_page = 1252;
+  ForEachProperty(set, [&](uint32_t id, uint32_t at) {
+    if (id == kCodePageId) code_page = Little16(set, size_t{at} + 4);
+  });
+  return code_page;
 }
 
 template <size_t Count>
@@ -65,15 +78,8 @@ void AddSet(const CompoundFile& file, std::string_view name, const Property (&pr
   const uint32_t begin = Little32(bytes, 44);
   if (bytes.size() < 48 || begin >= bytes.size()) return;
   const std::string_view set = std::string_view(bytes).substr(begin);
-  const uint32_t count = std::min(Little32(set, 4), kPropertiesMax);
-  const auto each = [&](const auto& take) {
-    for (uint32_t i = 0; i < count; ++i) take(Little32(set, 8 + i * 8), Little32(set, 12 + i * 8));
-  };
-  int code_page = 1252;
-  each([&](uint32_t id, uint32_t at) {
-    if (id == kCodePageId) code_page = Little16(set, size_t{at} + 4);
-  });
-  each([&](uint32_t id, uint32_t at) {
+  const int code_page = CodePageOf(set);
+  ForEachProperty(set, [&](uint32_t id, uint32_t at) {
     for (const Property& property : properties) {
       if (property.id == id) SetValue(set, at, code_page, property.field, findings);
     }
@@ -81,6 +87,14 @@ void AddSet(const CompoundFile& file, std::string_view name, const Property (&pr
 }
 
 }  // namespace
+
+int SummaryCodePage(const CompoundFile& file) {
+  constexpr size_t kHeadBytes = 4096;
+  const auto stream = file.Open("\005SummaryInformation");
+  const std::string bytes = stream != nullptr ? stream->ReadAt(0, kHeadBytes) : std::string();
+  const std::string_view set = std::string_view(bytes).substr(std::min<size_t>(Little32(bytes, 44), bytes.size()));
+  return CodePageOf(set);
+}
 
 void AddSummaryInformation(const CompoundFile& file, Findings& findings) {
   AddSet(file, "\005SummaryInformation", kSummary, findings);

@@ -91,4 +91,10 @@ std::optional<int64_t> ParseTime(std::string_view text) {
   return seconds.has_value() ? std::optional<int64_t>(*seconds - ZoneSeconds(text)) : std::nullopt;
 }
 
+std::optional<int64_t> FromFileTime(uint64_t ticks) {
+  constexpr int64_t kTicksPerSecond = 10000000, kSecondsTo1970 = 11644473600;
+  const auto seconds = static_cast<int64_t>(ticks & INT64_MAX) / kTicksPerSecond - kSecondsTo1970;
+  return seconds > 0 ? std::optional<int64_t>(seconds) : std::nullopt;
+}
+
 }  // namespace ferrox::extract

@@ -16,6 +16,9 @@ struct CivilTime {
 std::optional<int64_t> ToSeconds(const CivilTime& time);
 CivilTime FromSeconds(int64_t seconds);
 
+/// Of a time as Windows counts it; nothing before 1970.
+std::optional<int64_t> FromFileTime(uint64_t ticks);
+
 /// Reads "2024-03-01T10:11:12.5+02:00" and what is shorter, down to the year; the date's parts may stand between ":" as
 /// well, as cameras write them, and a blank for the "T". Without a zone, as UTC.
 std::optional<int64_t> ParseTime(std::string_view text);

@@ -76,13 +76,21 @@ ZipContainer::~ZipContainer() {
   if (archive_ != nullptr) zip_discard(archive_);
 }
 
-bool ZipContainer::Has(std::string_view name) const {
-  return archive_ != nullptr && zip_name_locate(archive_, std::string(name).c_str(), 0) >= 0;
+int64_t ZipContainer::Locate(std::string_view name) const {
+  std::string spelled(name);
+  const zip_int64_t exact = zip_name_locate(archive_, spelled.c_str(), 0);
+  if (exact >= 0) return exact;
+  const zip_int64_t other_case = zip_name_locate(archive_, spelled.c_str(), ZIP_FL_NOCASE);
+  if (other_case >= 0) return other_case;
+  std::replace(spelled.begin(), spelled.end(), '/', '\\');
+  return zip_name_locate(archive_, spelled.c_str(), ZIP_FL_NOCASE);
 }
+
+bool ZipContainer::Has(std::string_view name) const { return archive_ != nullptr && Locate(name) >= 0; }
 
 std::unique_ptr<ByteSource> ZipContainer::Open(std::string_view name) {
   if (archive_ == nullptr || exhausted_) return nullptr;
-  const zip_int64_t index = zip_name_locate(archive_, std::string(name).c_str(), 0);
+  const int64_t index = Locate(name);
   zip_stat_t info;
   if (index < 0 || zip_stat_index(archive_, static_cast<zip_uint64_t>(index), 0, &info) != 0) return nullptr;
   zip_file_t* file = zip_fopen_index(archive_, static_cast<zip_uint64_t>(index), 0);

@@ -37,6 +37,8 @@ class ZipContainer {
 
  private:
   friend class ZipMember;
+  /// The number of a member; -1 when there is none. Some programs write names in another case, or as Windows does.
+  int64_t Locate(std::string_view name) const;
 
   /// Whether `bytes` more may be unpacked.
   bool Spend(uint64_t bytes);
