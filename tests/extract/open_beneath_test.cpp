@@ -54,7 +54,9 @@ TEST_P(OpenBeneathTest, NothingIsReachedThroughALink) {
   };
   for (const auto& row : rows) {
     EXPECT_EQ(row.content, Read(row.path)) << row.path;
-    EXPECT_EQ(row.error, errno) << row.path;
+    if (row.error != 0) {
+      EXPECT_EQ(row.error, errno) << row.path;
+    }
   }
   ASSERT_EQ(0, mkfifo((dir_ / "share/fifo").c_str(), 0600));
   EXPECT_TRUE(OpenBeneath(dir_ / "share", dir_ / "share/fifo", GetParam()).Valid()) << "opened without waiting";

@@ -35,7 +35,7 @@ int OpenFolder(const std::string& path) {
 uint64_t MountOf(int folder) {
   struct statx status = {};
   if (statx(folder, "", AT_EMPTY_PATH, STATX_MNT_ID, &status) < 0) return 0;
-  if ((status.stx_mask & STATX_MNT_ID) != 0) return status.stx_mnt_id;
+  if ((status.stx_mask & STATX_MNT_ID) != 0 && status.stx_mnt_id != 0) return status.stx_mnt_id;
   return uint64_t{status.stx_dev_major} << 32 | status.stx_dev_minor;
 }
 
