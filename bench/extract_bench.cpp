@@ -51,8 +51,8 @@ using namespace ferrox;
 using namespace ferrox::extract;
 using SteadyClock = std::chrono::steady_clock;
 
-constexpr std::chrono::milliseconds kTimeForAFile(1000);
-constexpr size_t kRunsMin = 5;
+constexpr std::chrono::milliseconds kTimeForAFile(1500);
+constexpr size_t kRunsMin = 9;
 
 struct Row {
   const char* name;

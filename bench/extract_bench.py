@@ -40,7 +40,9 @@ TOOLS = {
     "rtf": ["catdoc"],
     "zip": ["unzip", "-l"],
 }
-ORDER = ["txt", "html", "pdf", "docx", "xlsx", "pptx", "odt", "epub", "jpg", "flac", "mp3", "mp4", "eml", "doc", "xls", "rtf", "zip"]
+ORDER = ["txt", "html", "pdf", "docx", "xlsx", "pptx", "odt", "epub", "jpg", "flac", "mp3", "mp4", "eml", "doc", "xls", "rtf",
+         "zip"]
+SIZES = [1000, 100000, 1000000]
 
 
 class Samples:
@@ -79,8 +81,14 @@ class Samples:
     def make_texts(self):
         self.write("txt", "\n\n".join(self.paragraphs))
         body = "".join(f"<p class='a'>{text}</p>\n" for text in self.paragraphs)
-        self.write("html", f"<!DOCTYPE html><html><head><meta charset='utf-8'><title>Sample</title></head><body>{body}</body></html>")
-        self.write("csv", "".join(f"{word},{i},{i / 7:.3f}\n" for i, word in enumerate(self.random.choices(self.words, k=20000))))
+        head = "<meta charset='utf-8'><title>Sample</title>"
+        self.write("html", f"<!DOCTYPE html><html><head>{head}</head><body>{body}</body></html>")
+        names = self.random.choices(self.words, k=20000)
+        self.write("csv", "".join(f"{name},{i},{i / 7:.3f}\n" for i, name in enumerate(names)))
+        lines = "".join(f"w\u00f6rter{i} und\n" for i in range(80000)).encode()
+        for size in SIZES:
+            with open(self.path(f"{size}.txt"), "wb") as file:
+                file.write(lines[:size])
         message = email.message.EmailMessage()
         message["From"], message["To"], message["Subject"] = "Ann <ann@example.org>", "Bob <bob@example.org>", "Sample"
         message.set_content("\n".join(self.paragraphs))
@@ -143,8 +151,8 @@ class Samples:
 def run_quietly(*command):
     if shutil.which(command[0]) is None:
         return False
-    done = subprocess.run(command, stdin=subprocess.DEVNULL, stdout=subprocess.DEVNULL, stderr=subprocess.DEVNULL, check=False)
-    return done.returncode == 0
+    nothing = subprocess.DEVNULL
+    return subprocess.run(command, stdin=nothing, stdout=nothing, stderr=nothing, check=False).returncode == 0
 
 
 def take_one_processor():
@@ -177,23 +185,38 @@ def speed(seconds, size):
     return f"{1 / seconds:,.0f} / {size / seconds / 1e6:,.1f}"
 
 
+def tool_name(kind):
+    return " ".join(TOOLS[kind][:2 if TOOLS[kind][0] == "unzip" else 1])
+
+
+def measured(bench, paths):
+    """For each file the seconds in process and by ParseFile."""
+    out = subprocess.run([bench, *paths], stdout=subprocess.PIPE, text=True, check=True).stdout
+    return [[float(part) / 1e6 for part in line.split("\t")[1:]] for line in out.splitlines()]
+
+
 def print_formats(bench, samples):
     kinds = [kind for kind in ORDER if os.path.exists(samples.path(kind))]
-    out = subprocess.run([bench, *[samples.path(kind) for kind in kinds]], stdout=subprocess.PIPE, text=True, check=True).stdout
-    print("| files a second / MB a second | size | in process | `ParseFile` | isolation | tool | against it |\n"
+    print("| files a second / MB a second | size | in process | `ParseFile` | isolation | tool | `ParseFile` is |\n"
           "|---|---|---|---|---|---|---|")
-    for kind, line in zip(kinds, out.splitlines()):
-        here, isolated = (float(part) / 1e6 for part in line.split("\t")[1:])
+    for kind, (here, isolated) in zip(kinds, measured(bench, [samples.path(kind) for kind in kinds])):
         size = os.path.getsize(samples.path(kind))
         tool = tool_seconds(kind, samples.path(kind))
-        against = f"{speed(tool, size)} (`{' '.join(TOOLS[kind][:2 if kind in ('zip', 'txt') else 1])}`) | {tool / isolated:.1f} times" if tool else "|"
+        compared = f"{speed(tool, size)} (`{tool_name(kind)}`) | {tool / isolated:.1f} times as fast" if tool else "|"
         print(f"| {kind.upper()} | {size / 1000:,.0f} KB | {speed(here, size)} | {speed(isolated, size)} "
-              f"| {100 * (isolated / here - 1):+.0f} % | {against} |", flush=True)
+              f"| {1000 * (isolated - here):+.2f} ms, {100 * (isolated / here - 1):+.0f} % | {compared} |", flush=True)
+
+
+def print_sizes(bench, samples):
+    taken = measured(bench, [samples.path(f"{size}.txt") for size in SIZES])
+    print("\n| plain text | " + " | ".join(f"{size // 1000:,} KB" for size in SIZES) + " |\n|---|" + "---|" * len(SIZES))
+    for way, name in enumerate(("in process", "`ParseFile`")):
+        print(f"| {name} | " + " | ".join(f"{1000 * one[way]:.3f} ms" for one in taken) + " |")
 
 
 def print_starts(bench):
     out = subprocess.run([bench, "--starts"], stdout=subprocess.PIPE, text=True, check=True).stdout
-    print("\n| start, milliseconds | program and first worker | further worker |\n|---|---|---|")
+    print("\n| milliseconds | program and first worker | further worker |\n|---|---|---|")
     for line in out.splitlines():
         program, first, further = line.split("\t")
         print(f"| `{program}` | {float(first):.1f} | {float(further):.1f} |")
@@ -209,6 +232,7 @@ def main():
     take_one_processor()
     bench = os.path.join(options.build, "bin", "extract_bench")
     print_formats(bench, samples)
+    print_sizes(bench, samples)
     print_starts(bench)
     return 0
 
