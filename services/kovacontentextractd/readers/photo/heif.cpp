@@ -93,14 +93,18 @@ std::string ItemBytes(std::string_view file, std::string_view meta, uint64_t wan
     (void)places.Number(2);
     const uint64_t base = places.Number(base_size);
     const std::string_view from = in_data_box ? ContentOf(meta, "idat"sv) : file;
+    const uint64_t count = places.Number(2);
+    Bytes pieces(
+        places.Take(count * (index_size + offset_size + length_size)));  // that may be none, so often it is told
+    if (number != wanted) continue;
     std::string bytes;
-    for (uint64_t pieces = places.Number(2); pieces > 0 && !places.Ended(); --pieces) {
-      (void)places.Number(index_size);
-      const uint64_t at = base + places.Number(offset_size), length = places.Number(length_size);
-      if (number != wanted || at >= from.size() || bytes.size() > kPartMaxBytes) continue;
+    while (!pieces.Ended() && bytes.size() <= kPartMaxBytes) {
+      (void)pieces.Number(index_size);
+      const uint64_t at = base + pieces.Number(offset_size), length = pieces.Number(length_size);
+      if (at >= from.size()) continue;
       bytes += from.substr(static_cast<size_t>(at), static_cast<size_t>(std::min<uint64_t>(length, kPartMaxBytes)));
     }
-    if (number == wanted) return bytes;
+    return bytes;
   }
   return {};
 }
