@@ -54,6 +54,9 @@ def add_pictures(out):
     box = atom(b"ftyp", b"heic" + bytes(4) + b"mif1heic")
     out.add("photo/nested.heic", box, nest(b"meta", 5000, bytes(4)))
     out.add("photo/loop.heic", box, atom(b"meta", bytes(4) + atom(b"iinf", struct.pack(">IH", 0, 65535)) + atom(b"iloc", struct.pack(">IHH", 0x01000000, 0x4444, 65535))))
+    item = atom(b"infe", struct.pack(">IHH", 2 << 24, 1, 0) + b"Exif\0")
+    places = struct.pack(">IHH", 0, 0, 65535) + struct.pack(">HHH", 2, 0, 65535) * 65535
+    out.add("photo/pieces.heic", box, atom(b"meta", bytes(4) + atom(b"iinf", struct.pack(">IH", 0, 1) + item) + atom(b"iloc", places)))
     out.add("photo/zero.heic", box, atom(b"meta", b"", 0), atom(b"free", b"", 0) * 100000)
     out.add("photo/boxes.avif", box.replace(b"heic", b"avif"), atom(b"free", b"") * 500000)
     out.add("photo/resources.psd", b"8BPS\0\1" + bytes(6) + struct.pack(">HIIHH", 3, side, side, 8, 3), struct.pack(">II", 0, 0x7FFFFFFF), b"8BIM\4\4\0\0" + b"\xff" * 4)

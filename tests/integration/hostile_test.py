@@ -340,7 +340,10 @@ class HostileTest(InstanceTestCase):
         jobs.sort(key=lambda job: b"endless" not in (job.__defaults__[0] if len(job.__defaults__) == 1 else b""))
         self.survives(jobs)
         endless = [path for seconds, error, path in self.slow if error == "took too long"]
-        self.assertEqual([b"endless.mp4"], [os.path.basename(path) for path in endless])
+        names = {os.path.basename(path) for path in endless}
+        self.assertIn(b"endless.mp4", names)
+        if not SANITIZED:
+            self.assertEqual(1, len(names), names)
 
     def test_damaged_files(self):
         self.survives(self.damaged())
@@ -377,7 +380,9 @@ class HostileTest(InstanceTestCase):
         hostile.make_all(share)
         shutil.rmtree(f"{share}/set/special")
         self.ctl("folder", "add", "/docs")
-        self.instance.wait_idle("docs", share.rstrip("/"))
+        queue = self.instance.queue_path(share)
+        wait_for(lambda: self.instance.share_status("docs")["state"] == "idle" and not os.path.exists(queue),
+                 "the share to be indexed", 500)
         written, files = self.instance.share_status("docs")["written"], self.status()["files"]
         self.assertGreater(files, 500)
         found = [entry.get("_KOVAExtractError") for entry in self.instance.entries("docs", share, "_KOVAExtractError")]
