@@ -95,18 +95,19 @@ NumberFormat ParseNumberFormat(std::string_view code) {
 }
 
 NumberFormat BuiltInNumberFormat(int id) {
-  if ((id >= 14 && id <= 22) || (id >= 27 && id <= 36) || (id >= 45 && id <= 58)) return {NumberFormat::kDate};
-  const bool is_sum = id >= 37 && id <= 44;
-  const bool no_decimals =
-      id == 1 || id == 3 || id == 5 || id == 6 || id == 9 || id == 37 || id == 38 || id == 41 || id == 42;
-  if ((id < 1 || id > 10) && !is_sum) return {};
-  const bool percent = id == 9 || id == 10;
-  return {NumberFormat::kFixed, no_decimals ? 0 : 2, id >= 3 && !percent, percent};
+  const auto is_in = [id](int first, int last) { return id >= first && id <= last; };
+  if (is_in(14, 22) || is_in(27, 36) || is_in(45, 47) || is_in(50, 58)) return {NumberFormat::kDate};
+  static constexpr const char* kCodes[] = {"General", "0",        "0.00",     "#,##0", "#,##0.00", "#,##0",
+                                           "#,##0",   "#,##0.00", "#,##0.00", "0%",    "0.00%"};
+  if (is_in(0, 10)) return ParseNumberFormat(kCodes[id]);
+  if (is_in(37, 44)) return ParseNumberFormat((id - 37) % 4 < 2 ? "#,##0" : "#,##0.00");  // sums, with signs around
+  return {};
 }
 
 std::string NumberText(double value, const NumberFormat& format, bool from_1904) {
-  if (format.kind == NumberFormat::kDate) return DateText(value, from_1904);
-  std::string text = GeneralText(value);
+  std::string text = format.kind == NumberFormat::kDate ? DateText(value, from_1904) : std::string();
+  if (!text.empty()) return text;
+  text = GeneralText(value);  // also of what no calendar has
   const std::string shown = format.kind == NumberFormat::kFixed ? FixedText(value, format) : std::string();
   return shown.empty() || shown == text ? text : text + " " + shown;
 }
