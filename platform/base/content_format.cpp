@@ -109,8 +109,6 @@ constexpr Format kFormats[] = {
     {"video/3gpp", "video", Program::kVideo, 1},
     {"video/ogg", "video", Program::kVideo, 1},
     {"video/x-dv", "video", Program::kVideo, 1},
-    {"application/mxf", "video", Program::kVideo, 1},
-    {"application/vnd.rn-realmedia", "video", Program::kVideo, 1},
 };
 
 /// What is none of the above.

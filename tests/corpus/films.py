@@ -19,19 +19,17 @@ TEXTS = {
     "japanese": ("夏休みの思い出", "小津安二郎", "家族", "海辺で撮影"),
     "polish": ("Wakacje nad jeziorem", "Łucja Ślązak", "Rodzinny", "żeglowanie o świcie"),
 }
-REAL_MEDIA = "application/vnd.rn-realmedia"
 
 # Whose, name, extension here, MIME type.
 AS_THEY_ARE = [
     (MIMETYPE, "3gp.3gp", "3gp", "video/3gpp"), (MIMETYPE, "asf.asf", "asf", "video/x-ms-wmv"),
     (MIMETYPE, "flv.flv", "flv", "video/x-flv"), (MIMETYPE, "mkv.mkv", "mkv", "video/x-matroska"),
     (MIMETYPE, "mov.mov", "mov", "video/quicktime"), (MIMETYPE, "mp4.mp4", "mp4", "video/mp4"),
-    (MIMETYPE, "ogg.ogv", "ogv", "video/ogg"), (MIMETYPE, "rmvb.rmvb", "rmvb", REAL_MEDIA),
+    (MIMETYPE, "ogg.ogv", "ogv", "video/ogg"),
     (MIMETYPE, "webm.webm", "webm", "video/webm"), ("taglib", "no-tags.3g2", "3g2", "video/3gpp"),
     ("taglib", "blank_video.m4v", "m4v", "video/mp4"), ("exiftool", "RIFF.avi", "avi", "video/x-msvideo"),
     ("exiftool", "Pentax.avi", "avi", "video/x-msvideo"), ("exiftool", "QuickTime.mov", "mov", "video/quicktime"),
     ("exiftool", "Matroska.mkv", "mkv", "video/x-matroska"), ("exiftool", "DV.dv", "dv", "video/x-dv"),
-    ("exiftool", "Real.rm", "rm", REAL_MEDIA), ("exiftool", "MXF.mxf", "mxf", "application/mxf"),
 ]
 # What exiftool does not say, or says of another part of the file: ffprobe does.
 CORRECTED = {
@@ -40,10 +38,8 @@ CORRECTED = {
     "asf.asf": {"KOVAMDDurationSecond": tools.near(4.4, 0.05)},
     "ogg.ogv": {"KOVAMDDurationSecond": None},
     "DV.dv": {"KOVAMDDurationSecond": None, "KOVAMDAudioChannelCount": None},
-    "MXF.mxf": {"KOVAMDAudioSampleRate": None},
     "RIFF.avi": {"KOVAMDContentCreationDate": tools.seconds_of("2003:03:10 15:04:43")},
     "Pentax.avi": {"KOVAMDContentCreationDate": tools.seconds_of("2009:10:27 12:14:34")},
-    "Real.rm": {"KOVAMDTitle": "A title", "KOVAMDDurationSecond": None},
 }
 
 
@@ -178,6 +174,9 @@ def add_broadcasts(corpus):
         for extension, times in (("ts", False), ("m2ts", True)):
             packets = gray_film.transport_stream(width, height, seconds, times)
             corpus.add(f"ts/of_{seconds}_seconds.{extension}", packets, fields=fields, mime="video/mp2t")
+    by_name = (("Real.rm", "rm", "application/vnd.rn-realmedia"), ("MXF.mxf", "mxf", "application/mxf"))
+    for name, extension, mime in by_name:
+        corpus.add(f"{extension}/by_name.{extension}", donor(corpus, "exiftool", name), mime=mime)
     corpus.add("ts/no_film.ts", b"export const answer: number = 42; // in TypeScript\n", ["TypeScript"])
 
 
