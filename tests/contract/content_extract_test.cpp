@@ -67,6 +67,15 @@ TEST_F(ContentExtractTest, ADaemonIsStartedOnceForAllThatNeedIt) {
   EXPECT_EQ(1, KLIBServiceIsRunning(kService));
 }
 
+TEST_F(ContentExtractTest, AKeptConnectionIsMadeAnewWhenItHasEnded) {
+  for (const char letter : {'a', 'b', 'c'}) {
+    const string text(100000, letter);
+    EXPECT_EQ(text, ParseBytes("long.txt", text)["KOVAMDTextContent"].asString());
+    EXPECT_EQ("short", ParseBytes("short.txt", "short")["KOVAMDTextContent"].asString()) << "not the rest of the last";
+    ASSERT_EQ(0, KLIBServiceStop(kService, 1));
+  }
+}
+
 TEST_F(ContentExtractTest, WithoutADaemonNothingIsSaidOfTheFile) {
   ASSERT_EQ(0, KLIBServiceStop(kService, 1));
   const string socket = TestRoot() + "/var/run/kovacontentextractd.sock";
