@@ -28,7 +28,7 @@ class ExtractionTest(InstanceTestCase):
         return {os.path.basename(entry["KOVAMDPath"]): {name: entry.get(name) for name in names}
                 for entry in self.instance.entries("docs", folder, "KOVAMDPath", *names)}
 
-    def worker_pids(self):
+    def child_pids(self):
         pid = self.instance.pid(DAEMON)
         found = []
         for task in os.listdir(f"/proc/{pid}/task"):
@@ -100,6 +100,7 @@ class ExtractionTest(InstanceTestCase):
         state = self.commit_and_status()
         self.assertIn(b"not installed: kovacontentworker-pdf;", state)
         self.assertRegex(state, b"1 its reader, kovacontentworker-pdf, is not installed")
+        self.instance.wait_idle("docs", folder)
         written = self.docs()["written"]
         self.ctl("index", "docs", "--wait")
         self.assertEqual(written, self.docs()["written"], "nothing has changed")
@@ -126,7 +127,7 @@ class ExtractionTest(InstanceTestCase):
         lines = [json.loads(line) for line in self.ctl("unread", "--json", "docs").splitlines()]
         self.assertEqual([(f"{folder}/{name}", "damaged") for name in ("b\n.pdf", "c.pdf")],
                          [(line["path"], line["reason"]) for line in lines])
-        self.assertEqual(f"{folder}/b\\x0a.pdf\n    damaged\n{folder}/c.pdf\n    damaged\n", self.ctl("unread").decode())
+        self.assertEqual(f"{folder}/b\\x0A.pdf\n    damaged\n{folder}/c.pdf\n    damaged\n", self.ctl("unread").decode())
         self.assertIn(b"all: fileindexctl unread docs", self.commit_and_status())
 
     def commit_and_status(self):
@@ -139,16 +140,20 @@ class ExtractionTest(InstanceTestCase):
         status = self.instance.status()["content_extraction"]
         self.assertEqual((1, 0), (status["files"], status["blamed"]))
         self.assertRegex(self.ctl("status"), b"content extraction: runs, process [0-9]+, 1 of at most [0-9]+ workers, 1 files")
-        for pid in self.worker_pids():
+        workers = 0
+        for pid in self.child_pids():
             with open(f"/proc/{pid}/status", encoding="ascii") as file:
                 facts = dict(line.split(":\t", 1) for line in file.read().splitlines() if ":\t" in line)
+            if facts["NoNewPrivs"] == "0":
+                continue  # what workers are forked from
+            workers += 1
             self.assertEqual("0000000000000000", facts["CapEff"])
-            self.assertEqual("1", facts["NoNewPrivs"])
             if "seccomp" not in status["missing"]:
                 self.assertEqual("2", facts["Seccomp"])
             if os.geteuid() == 0:
                 self.assertEqual([str(NOBODY)] * 4, facts["Uid"].split())
                 self.assertNotEqual(os.stat("/"), os.stat(f"/proc/{pid}/root/"))
+        self.assertEqual(status["workers"], workers)
 
 
 if __name__ == "__main__":

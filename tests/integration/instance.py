@@ -57,7 +57,10 @@ class Instance:
         return done.stdout
 
     def status(self):
-        return json.loads(self.ctl("status", "--json"))
+        done = self.run("status", "--json")
+        assert done.returncode in (0, 3), done.stderr  # 3: a daemon has just been killed
+        self.note_pids()
+        return json.loads(done.stdout)
 
     def share_status(self, name):
         return next(s for s in self.status()["index_daemon"]["shares"] if s["share"] == name)
