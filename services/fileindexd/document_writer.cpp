@@ -3,6 +3,7 @@
 #include <cerrno>
 
 #include <kova/content_extract.h>
+#include <kova/content_type.h>
 
 #include "common/file_util.h"
 
@@ -19,6 +20,12 @@ namespace {
 bool IsWorthAnotherTry(const IndexedEntry& indexed) {
   return indexed.with_content && (indexed.extract_failed || indexed.extract_version == 0) &&
          indexed.extract_version < ExtractVersion(indexed.content_type);
+}
+
+/// Whether the content told another type than the name does, which the attributes alone would put in its place.
+bool NameTellsAnotherType(const IndexedEntry& indexed, const std::string& path) {
+  const char* by_name = kova::content::TypeByExtension(GetFileExtension(Basename(path), true));
+  return indexed.with_content && by_name != nullptr && !indexed.content_type.empty() && indexed.content_type != by_name;
 }
 
 }  // namespace
@@ -55,7 +62,7 @@ void DocumentWriter::RefreshAttributes(const std::string& path) {
   const auto indexed = index_.Find(path);
   const bool same_content = !indexed.empty() && SameContent(indexed.front().stamp, Stamp(status)) &&
                             indexed.front().with_content == WantsContent(path, status);
-  if (!same_content) return Write(path);
+  if (!same_content || NameTellsAnotherType(indexed.front(), path)) return Write(path);
   try {
     WillChange();
     index_.Attr(path);

@@ -109,6 +109,17 @@ class ExtractionTest(InstanceTestCase):
         self.assertEqual(written + 1, self.docs()["written"])
         self.assertEqual([os.fsencode(f"{folder}/a.pdf")], self.instance.search("zeppelin"))
 
+    def test_type_that_the_content_tells_outlives_a_change_of_attributes(self):
+        folder = self.indexed(a="balloon")
+        write(f"{folder}/text.jpg", "zeppelin")
+        self.ctl("index", "docs", "--wait")
+        self.instance.wait_idle("docs", folder)
+        os.chmod(f"{folder}/text.jpg", 0o600)
+        self.ctl("search", "--fresh", "zeppelin")
+        os.rename(f"{folder}/text.jpg", f"{folder}/moved.jpg")
+        self.ctl("search", "--fresh", "zeppelin")
+        self.assertEqual("text/plain", self.fields(folder, "KOVAMDContentType")["moved.jpg"]["KOVAMDContentType"])
+
     def test_what_was_read_of_a_file_is_told(self):
         folder = self.indexed(a="zeppelin\nover the sea " * 40)
         write(f"{folder}/page.html", "<title>Airships</title><p>balloon")
