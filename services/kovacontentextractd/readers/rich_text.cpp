@@ -9,6 +9,7 @@
 
 #include "services/kovacontentextractd/readers/byte_source.h"
 #include "services/kovacontentextractd/readers/code_pages.h"
+#include "services/kovacontentextractd/readers/cpu_budget.h"
 #include "services/kovacontentextractd/readers/times.h"
 #include "services/kovacontentextractd/readers/utf8.h"
 
@@ -23,7 +24,7 @@ constexpr size_t kFontsMax = 10000;
 constexpr size_t kPieceBytes = 32U << 10;
 constexpr int kMacRoman = 10000;
 /// Pictures are most of a long file, written in letters.
-constexpr uint64_t kReadMaxBytes = 256U << 20;
+constexpr std::chrono::milliseconds kCpuMax(1500);
 
 /// Where text goes in a group.
 enum class Target : uint8_t { kText, kNowhere, kFontTable, kField };
@@ -139,7 +140,7 @@ class RichTextReader {
     }
     FlushBytes();
     FlushText();
-    if (read_ > kReadMaxBytes) findings_.MarkCut();
+    if (budget_.IsSpent()) findings_.MarkCut();
   }
 
  private:
@@ -147,8 +148,7 @@ class RichTextReader {
 
   int Get() {
     if (at_ == size_) {
-      size_ = read_ <= kReadMaxBytes ? source_.Read(buffer_.data(), buffer_.size()) : 0;
-      read_ += size_;
+      size_ = budget_.IsSpent() ? 0 : source_.Read(buffer_.data(), buffer_.size());
       at_ = 0;
     }
     return at_ < size_ ? static_cast<unsigned char>(buffer_[at_++]) : -1;
@@ -359,7 +359,7 @@ class RichTextReader {
   Findings& findings_;
   std::array<char, 16384> buffer_;
   size_t at_ = 0, size_ = 0;
-  uint64_t read_ = 0;
+  const CpuBudget budget_{kCpuMax};
   std::vector<Group> groups_;
   std::map<int, int> fonts_;  ///< their code pages
   int font_ = 0;              ///< the one in the table that is being read

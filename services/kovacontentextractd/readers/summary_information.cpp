@@ -12,6 +12,7 @@ namespace {
 constexpr size_t kSetMaxBytes = 1U << 20;
 constexpr size_t kTextMaxBytes = 64U << 10;
 constexpr uint32_t kPropertiesMax = 1000;
+constexpr int kValuesMax = 100;  ///< of those that are wanted: a set has each once
 constexpr uint32_t kCodePageId = 1;
 enum ValueType : uint32_t { kInt16 = 2, kInt32 = 3, kBytes = 30, kUtf16 = 31, kFileTime = 64 };
 
@@ -79,9 +80,10 @@ void AddSet(const CompoundFile& file, std::string_view name, const Property (&pr
   if (bytes.size() < 48 || begin >= bytes.size()) return;
   const std::string_view set = std::string_view(bytes).substr(begin);
   const int code_page = CodePageOf(set);
+  int values = 0;
   ForEachProperty(set, [&](uint32_t id, uint32_t at) {
     for (const Property& property : properties) {
-      if (property.id == id) SetValue(set, at, code_page, property.field, findings);
+      if (property.id == id && ++values <= kValuesMax) SetValue(set, at, code_page, property.field, findings);
     }
   });
 }
