@@ -29,6 +29,7 @@ from urllib.parse import unquote
 import indexers
 from mixed.folder import make_folder
 
+HITS_MAX = 1000
 FIGURES = (("wall_s", "wall time, s", "{:.1f}"), ("cpu_s", "processor time, s", "{:.1f}"),
            ("peak_MiB", "peak memory of all processes, MiB", "{:.0f}"), ("index_MB", "index, MB", "{:.1f}"))
 
@@ -38,7 +39,7 @@ class Ours(indexers.Ours):
         self.ctl("up")
 
     def hits(self, word):
-        done = subprocess.run([self.tool, "--root", self.root, "search", "--json", "--limit", "20", word],
+        done = subprocess.run([self.tool, "--root", self.root, "search", "--json", "--limit", str(HITS_MAX), word],
                               capture_output=True, check=False)
         if done.returncode not in (0, 1):
             raise RuntimeError(done.stderr.decode())
@@ -50,7 +51,7 @@ class Recoll(indexers.Recoll):
         pass
 
     def hits(self, word):
-        done = self.run("recollq", "-c", self.config, "-b", "-n", "0-20", word)
+        done = self.run("recollq", "-c", self.config, "-b", "-n", f"0-{HITS_MAX}", word)
         return {unquote(line.removeprefix("file://")) for line in done.stdout.decode(errors="replace").splitlines()}
 
 

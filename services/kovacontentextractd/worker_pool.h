@@ -20,9 +20,9 @@
 
 namespace ferrox::extract {
 
-/// Workers, as many as there are processors, of the programs that are asked for. They are made when they are needed,
-/// ended when they have read many files or have had nothing to do for a while, and replaced when a file has killed
-/// them. So is what they are made of.
+/// Workers, some more than there are processors, of the programs that are asked for. They are made when they are
+/// needed, ended when they have read many files or have had nothing to do for a while, and replaced when a file has
+/// killed them. So is what they are made of.
 class WorkerPool {
  public:
   struct Options {
