@@ -141,10 +141,10 @@ class Recoll:
         return ""
 
     @staticmethod
-    def run(*command):
+    def run(*command, check=True):
         """Its helpers are Python programs, which need the packages of the system's Python."""
         path = "/usr/bin:/bin:" + os.environ.get("PATH", "")
-        return subprocess.run(command, env=dict(os.environ, PATH=path), check=True, capture_output=True)
+        return subprocess.run(command, env=dict(os.environ, PATH=path), check=check, capture_output=True)
 
     def index(self, folder):
         with open(f"{self.config}/recoll.conf", "w", encoding="utf-8") as file:

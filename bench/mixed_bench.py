@@ -51,7 +51,8 @@ class Recoll(indexers.Recoll):
         pass
 
     def hits(self, word):
-        done = self.run("recollq", "-c", self.config, "-b", "-n", f"0-{HITS_MAX}", word)
+        # A word that it cannot read is an error for it.
+        done = self.run("recollq", "-c", self.config, "-b", "-n", f"0-{HITS_MAX}", word, check=False)
         return {unquote(line.removeprefix("file://")) for line in done.stdout.decode(errors="replace").splitlines()}
 
 
