@@ -9,12 +9,14 @@
 #include <cstdlib>
 #include <string>
 #include <string_view>
+#include <vector>
 
 #include "common/unique_fd.h"
 #include "services/kovacontentextractd/answer.h"
 #include "services/kovacontentextractd/readers/reader.h"
 #include "services/kovacontentextractd/readers/utf8.h"
 #include "services/kovacontentextractd/region.h"
+#include "services/kovacontentextractd/worker_protocol.h"
 
 using namespace ferrox::extract;
 
@@ -42,7 +44,9 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   const std::string bytes(reinterpret_cast<const char*>(data), size);
   const std::string json = bytes.substr(0, bytes.find('\0'));
   Json::Value fields(Json::objectValue);
-  const bool taken = ParseAnswer(json, fields);
+  std::vector<AttachedBytes> attachments;
+  const bool taken = ParseAnswer(json, fields, attachments);
+  for (const AttachedBytes& one : attachments) Require(uint64_t{one.offset} + one.bytes <= kRegionBytes);
   Require(taken || fields.empty());
   Require(!fields.isMember("KOVAMDPath") && !fields.isMember("KOVAMDTextContent"));
   for (const Json::Value& value : fields) {

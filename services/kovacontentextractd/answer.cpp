@@ -8,7 +8,9 @@
 #include "common/json_util.h"
 #include "fileindex/elastic/elastic_control.h"
 #include "fileindex/elastic/fields.h"
+#include "services/kovacontentextractd/readers/reader.h"
 #include "services/kovacontentextractd/readers/utf8.h"
+#include "services/kovacontentextractd/worker_protocol.h"
 
 namespace ferrox::extract {
 
@@ -17,6 +19,7 @@ namespace {
 namespace elastic = fileindex::elastic;
 
 constexpr size_t kFieldMaxBytes = 64U << 10;
+constexpr size_t kNameMaxBytes = 1024;
 
 /// What is known without the content, and so is not for it to say.
 constexpr const char* kFacts[] = {elastic::kKOVAMDPath,
@@ -77,9 +80,24 @@ Json::Value OfType(Type type, const Json::Value& value) {
   return value.isString() && value.asString().size() <= kFieldMaxBytes ? value : Json::Value();
 }
 
+/// The attachments that are listed, up to the first one that cannot be.
+std::vector<AttachedBytes> ListedAttachments(const Json::Value& list) {
+  std::vector<AttachedBytes> attachments;
+  uint32_t offset = kAttachmentsAt;
+  for (Json::ArrayIndex i = 0; list.isArray() && i < list.size() && i < Limits().attachments; ++i) {
+    const Json::Value& one = list[i];
+    if (!one.isObject() || !one["name"].isString() || !one["bytes"].isUInt()) break;
+    std::string name = one["name"].asString();
+    if (name.size() > kNameMaxBytes || one["bytes"].asUInt() > kRegionBytes - offset) break;
+    attachments.push_back({std::move(name), offset, one["bytes"].asUInt()});
+    offset += attachments.back().bytes;
+  }
+  return attachments;
+}
+
 }  // namespace
 
-bool ParseAnswer(const std::string& json, Json::Value& fields) {
+bool ParseAnswer(const std::string& json, Json::Value& fields, std::vector<AttachedBytes>& attachments) {
   static const Types types = MakeTypes();
   Json::Value said;
   if (ValidUtf8Prefix(json) != json.size() || !fromString(said, json) || !said.isObject()) return false;
@@ -89,6 +107,7 @@ bool ParseAnswer(const std::string& json, Json::Value& fields) {
     Json::Value value = OfType(known->second, *member);
     if (!value.isNull()) fields[known->first] = std::move(value);
   }
+  attachments = ListedAttachments(said[kAttachmentsMember]);
   return true;
 }
 

@@ -6,6 +6,7 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <chrono>
 #include <cstring>
 
 #include <kova/content_type.h>
@@ -15,6 +16,8 @@
 #include "common/json_util.h"
 #include "common/log.h"
 #include "services/kovacontentextractd/open_beneath.h"
+#include "services/kovacontentextractd/readers/reader.h"
+#include "services/kovacontentextractd/readers/utf8.h"
 #include "services/support/json_command.h"
 
 namespace ferrox::extract {
@@ -25,10 +28,22 @@ using namespace kova::content;
 
 constexpr char kErrorField[] = "_KOVAExtractError";
 constexpr char kTypeField[] = "KOVAMDContentType";
+constexpr char kCutField[] = "_KOVATextCut";
+constexpr Limits kLimits;
+/// All of a file together, so that nobody can keep a worker busy for minutes with one.
+constexpr std::chrono::seconds kAttachmentsLongest(30);
 
 /// What the document says when the file could not be opened.
 std::string OpenProblem(int problem) {
   return problem == ELOOP || problem == EXDEV ? "reached through a link" : strerror(problem);
+}
+
+/// The first bytes of a file; none, with errno, where they cannot be read.
+std::string HeadOf(int fd) {
+  std::string head(kHeadBytes, '\0');
+  const ssize_t got = pread(fd, head.data(), head.size(), 0);
+  head.resize(static_cast<size_t>(std::max<ssize_t>(got, 0)));
+  return head;
 }
 
 Json::Value ErrorDocument(const std::string& reason) {
@@ -127,21 +142,30 @@ Extractor::OpenedFile Extractor::OpenFile(const std::string& root, const std::st
   file.inode = info.st_ino;
   file.regular = S_ISREG(info.st_mode);
   if (!file.regular) return file;
-  file.head.resize(kHeadBytes);
-  const ssize_t got = pread(file.fd.Get(), file.head.data(), file.head.size(), 0);
-  if (got < 0) file.problem = errno;
-  file.head.resize(static_cast<size_t>(std::max<ssize_t>(got, 0)));
+  errno = 0;
+  file.head = HeadOf(file.fd.Get());
+  file.problem = errno;
   return file;
 }
 
 Json::Value Extractor::Read(int fd, std::string_view head, const std::string& path, TextTarget& text) {
-  const Task task = {fd, "", GetFileExtension(Basename(path), true), Basename(path)};
-  const char* type = head.empty() ? TypeByExtension(task.extension) : TypeOf(task.extension, head);
   Json::Value document(Json::objectValue);
+  const TextSink sink = [&text](size_t offset, std::string_view piece) { text.Take(offset, piece); };
+  const Task task = {fd, "", GetFileExtension(Basename(path), true), Basename(path)};
+  const Answer answer = ReadFile(task, head, document, sink);
+  for (const auto& name : answer.fields.getMemberNames()) {
+    if (!document.isMember(name)) document[name] = answer.fields[name];
+  }
+  text.End(AddAttachments(answer, document, text));
+  return document;
+}
+
+/// Finds out what the file is, which is put into `document`, and has it read by who can.
+Answer Extractor::ReadFile(const Task& task, std::string_view head, Json::Value& document, const TextSink& sink) {
+  const char* type = head.empty() ? TypeByExtension(task.extension) : TypeOf(task.extension, head);
   if (type != nullptr) document[kTypeField] = type;
   const Format* format = type != nullptr ? FormatOf(type) : &kUnknown;
-  if (head.empty() || format == nullptr) return document;
-  const TextSink sink = [&text](size_t offset, std::string_view piece) { text.Take(offset, piece); };
+  if (head.empty() || format == nullptr) return {};
   Answer answer = ReadAs(*format, task, document, sink);
   // What only a look at the bytes of an unknown file tells.
   const Format* second = format == &kUnknown ? FormatOf(answer.fields[kTypeField].asString()) : nullptr;
@@ -149,11 +173,37 @@ Json::Value Extractor::Read(int fd, std::string_view head, const std::string& pa
     document[kTypeField] = answer.fields[kTypeField];
     answer = ReadAs(*second, task, document, sink);
   }
-  for (const auto& name : answer.fields.getMemberNames()) {
-    if (!document.isMember(name)) document[name] = answer.fields[name];
+  return answer;
+}
+
+/// Adds the texts of the files within a file, as far as there is room for them, and the first reason why one could not
+/// be read. @return the bytes of all text
+size_t Extractor::AddAttachments(const Answer& answer, Json::Value& document, TextTarget& text) {
+  const auto end = std::chrono::steady_clock::now() + kAttachmentsLongest;
+  size_t bytes = answer.text_bytes;
+  for (const AttachedFile& attachment : answer.attachments) {
+    if (bytes + 1 >= kLimits.text_bytes || std::chrono::steady_clock::now() > end) break;
+    if (!attachment.file.Valid()) continue;
+    const size_t begin = bytes + 1, room = kLimits.text_bytes - begin;
+    size_t taken = 0;
+    const TextSink sink = [&](size_t offset, std::string_view piece) {
+      if (offset >= room) return;
+      const std::string_view fitting = CutAtCharacter(piece, room - offset);
+      text.Take(begin + offset, fitting);
+      taken = offset + fitting.size();
+    };
+    text.Take(bytes, "\n");
+    const std::string& name = attachment.name;
+    Json::Value ignored(Json::objectValue);
+    const Task task = {attachment.file.Get(), "", GetFileExtension(name, true), name, kLimits.nesting};
+    const Answer found = ReadFile(task, HeadOf(task.fd), ignored, sink);
+    if (found.text_bytes > 0) bytes = begin + taken;
+    if (found.text_bytes > taken || found.fields[kCutField].asBool()) document[kCutField] = true;
+    const Json::Value& reason = found.fields[kErrorField];
+    if (reason.isString() && !document.isMember(kErrorField))
+      document[kErrorField] = "attachment: " + reason.asString();
   }
-  text.End(answer.text_bytes);
-  return document;
+  return bytes;
 }
 
 Answer Extractor::ReadAs(const Format& format, const Task& task, Json::Value& document, const TextSink& sink) {

@@ -60,7 +60,9 @@ class Extractor {
   };
   OpenedFile OpenFile(const std::string& root, const std::string& path);
   Json::Value Read(int fd, std::string_view head, const std::string& path, TextTarget& text);
+  Answer ReadFile(const Task& task, std::string_view head, Json::Value& document, const TextSink& sink);
   Answer ReadAs(const kova::content::Format& format, const Task& task, Json::Value& document, const TextSink& sink);
+  size_t AddAttachments(const Answer& answer, Json::Value& document, TextTarget& text);
 
   WorkerPool pool_;
   OpenLimit open_limit_;

@@ -20,4 +20,11 @@ UniqueFd MakeRegion();
 /// @return false when it is longer than a text may be, or no UTF-8; the sink may have taken pieces of it then
 bool CopyText(int region, size_t bytes, const TextSink& sink);
 
+/// Copies an attachment out of a worker's region into memory of its own, which nobody can change afterwards. Not valid,
+/// with errno, when there is none.
+UniqueFd CopyAttachment(int region, size_t offset, size_t bytes);
+
+/// Gives back what the attachments in a region, of so many bytes together, took of the system's memory.
+void FreeAttachments(int region, size_t bytes);
+
 }  // namespace ferrox::extract

@@ -64,13 +64,28 @@ std::string ToText(const Json::Value& value) {
   return text.str();
 }
 
-/// The file's text goes to the region, to which `region` points: through a socket it would be copied twice more.
-bool Answer(char* region, uint32_t number, const Json::Value& fields, const std::string& text = {}) {
+bool Answer(uint32_t number, const Json::Value& fields, size_t text_bytes = 0) {
   std::string bytes = ToText(fields);
-  memcpy(region, text.data(), text.size());
-  const AnswerHeader header = {static_cast<uint32_t>(bytes.size()), static_cast<uint32_t>(text.size()), number};
+  const AnswerHeader header = {static_cast<uint32_t>(bytes.size()), static_cast<uint32_t>(text_bytes), number};
   bytes.insert(0, reinterpret_cast<const char*>(&header), sizeof(header));
   return WriteAll(bytes.data(), bytes.size());
+}
+
+/// Text and attachments go to the region, to which `region` points: through a socket they would be copied twice more.
+bool Answer(char* region, uint32_t number, const Findings& findings) {
+  static_assert(kAttachmentsAt >= Limits().text_bytes && kRegionBytes - kAttachmentsAt >= Limits().attached_bytes);
+  const std::string& text = findings.Text();
+  memcpy(region, text.data(), text.size());
+  Json::Value fields = findings.ToFields();
+  char* next = region + kAttachmentsAt;
+  for (const Attachment& attachment : findings.Attachments()) {
+    memcpy(next, attachment.bytes.data(), attachment.bytes.size());
+    next += attachment.bytes.size();
+    Json::Value& listed = fields[kAttachmentsMember].append(Json::Value());
+    listed["name"] = attachment.name;
+    listed["bytes"] = Json::UInt64(attachment.bytes.size());
+  }
+  return Answer(number, fields, text.size());
 }
 
 struct Request {
@@ -97,6 +112,7 @@ bool ReceiveRequest(Request& request) {
   if (got < static_cast<ssize_t>(sizeof(header)) || request.source.fd < 0) return false;
   memcpy(&header, buffer.data(), sizeof(header));
   request.number = header.number;
+  request.source.depth = header.depth;
   struct stat info = {};
   if (fstat(request.source.fd, &info) == 0) request.source.size = static_cast<uint64_t>(info.st_size);
   std::string_view come(buffer.data() + sizeof(header), static_cast<size_t>(got) - sizeof(header));
@@ -138,13 +154,13 @@ int ReadFiles(const Worker& worker, const char* empty_folder, int region_fd) {
   Json::Value greeting(Json::objectValue);
   greeting["missing"] = Json::Value(Json::arrayValue);
   for (const std::string& piece : CloseSandbox(empty_folder)) greeting["missing"].append(piece);
-  bool connected = Answer(region, 0, greeting);
+  bool connected = Answer(0, greeting);
   for (Request request; connected && ReceiveRequest(request);) {
     Findings findings;
     LimitCpuTime(kCpuSecondsPerFile);  // what the last file has left does not run while nothing is done
     Read(worker, request, findings);
     (void)close(request.source.fd);
-    connected = Answer(region, request.number, findings.ToFields(), findings.Text());
+    connected = Answer(region, request.number, findings);
   }
   return 0;
 }

@@ -36,8 +36,15 @@ const char* Reason(Outcome outcome) {
 
 /// Takes over what of an answer can be believed.
 bool Believe(const RawAnswer& raw, int region, const TextSink& text, Answer& answer) {
-  if (!ParseAnswer(raw.json, answer.fields) || !CopyText(region, raw.text_bytes, text)) return false;
+  std::vector<AttachedBytes> attachments;
+  if (!ParseAnswer(raw.json, answer.fields, attachments) || !CopyText(region, raw.text_bytes, text)) return false;
   answer.text_bytes = raw.text_bytes;
+  size_t attached_bytes = 0;
+  for (AttachedBytes& one : attachments) {
+    answer.attachments.push_back({std::move(one.name), CopyAttachment(region, one.offset, one.bytes)});
+    attached_bytes += one.bytes;
+  }
+  if (attached_bytes > 0) FreeAttachments(region, attached_bytes);
   return true;
 }
 

@@ -70,7 +70,8 @@ WorkerProcess::Outcome WorkerProcess::Ask(const Task& task, milliseconds longest
 /// Fits into the socket's buffer, so that a worker that takes nothing cannot hold us.
 bool WorkerProcess::Send(const Task& task) {
   const RequestHeader header = {static_cast<uint16_t>(task.reader.size()), static_cast<uint16_t>(task.extension.size()),
-                                static_cast<uint16_t>(task.name.size()), 0, ++requests_};
+                                static_cast<uint16_t>(task.name.size()), static_cast<uint16_t>(task.depth),
+                                ++requests_};
   std::string bytes(reinterpret_cast<const char*>(&header), sizeof(header));
   bytes += task.reader + task.extension + task.name;
   return services::SendWithDescriptors(socket_.Get(), bytes, {task.fd});

@@ -20,6 +20,7 @@ struct Task {
   std::string reader;     ///< which of the program's readers
   std::string extension;  ///< in lower case
   std::string name;
+  int depth = 0;  ///< how many files it is inside of
 };
 
 /// What a worker says, of which nothing is to be believed.

@@ -10,13 +10,15 @@ inline constexpr int kWorkerSocket = 3;
 inline constexpr uint32_t kAnswerMaxBytes = 2U << 20;
 /// The memory that a worker shares with the daemon. Its pages exist once they are written.
 inline constexpr uint32_t kRegionBytes = 16U << 20;
+/// Where in it the attachments begin, one behind the other; before them is room for the text.
+inline constexpr uint32_t kAttachmentsAt = 1U << 20;
 
 /// A request: this, sent together with the descriptor of the file, then the three texts one after the other.
 struct RequestHeader {
   uint16_t reader_bytes;
   uint16_t extension_bytes;
   uint16_t name_bytes;
-  uint16_t unused;
+  uint16_t depth;   ///< how many files the file is inside of
   uint32_t number;  ///< the first request of a worker is 1
 };
 
@@ -26,6 +28,9 @@ struct AnswerHeader {
   uint32_t text_bytes;  ///< of the file's text, which lies at the beginning of the region
   uint32_t number;      ///< of the request, so that no answer is taken for another file's
 };
+
+/// The member of that JSON which lists the attachments in their order: [{"name", "bytes"}, ...].
+inline constexpr char kAttachmentsMember[] = "attachments";
 
 /// To a template, with the descriptors of the worker's socket and region. It answers with a ForkAnswer.
 inline constexpr char kForkRequest = 'w';

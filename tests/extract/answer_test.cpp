@@ -4,6 +4,7 @@
 
 #include <string>
 #include <string_view>
+#include <vector>
 
 #include <gtest/gtest.h>
 
@@ -30,14 +31,15 @@ TEST(AnswerTest, OnlyWhatAFilesContentMaySayIsTaken) {
       {R"({"KOVAMDRecordingYear":1984,"KOVAMDDurationSecond":3,"KOVAMDPixelWidth":640,"KOVAMDISOSpeed":1.5})",
        R"({"KOVAMDDurationSecond":3.0,"KOVAMDPixelWidth":"640","KOVAMDRecordingYear":1984})"},
   };
+  std::vector<extract::AttachedBytes> attachments;
   for (const auto& row : rows) {
     Json::Value fields(Json::objectValue);
-    EXPECT_TRUE(ParseAnswer(row.json, fields)) << row.json;
+    EXPECT_TRUE(ParseAnswer(row.json, fields, attachments)) << row.json;
     EXPECT_EQ(row.taken, toString(fields)) << row.json;
   }
   Json::Value fields(Json::objectValue);
   const std::string title(100000, 'x');
-  EXPECT_TRUE(ParseAnswer("{\"KOVAMDTitle\":\"" + title + "\"}", fields));
+  EXPECT_TRUE(ParseAnswer("{\"KOVAMDTitle\":\"" + title + "\"}", fields, attachments));
   EXPECT_EQ("{}", toString(fields)) << "longer than any title is";
 }
 
@@ -45,11 +47,35 @@ TEST(AnswerTest, WhatIsNoAnswerIsRefused) {
   const std::string deep = std::string(100000, '[') + std::string(100000, ']');
   const std::string nested = "{\"KOVAMDTitle\":" + deep + "}";
   const std::string rows[] = {"", "x", "[]", "null", "{", "{}{}", deep, nested, "{\"KOVAMDTitle\":\"\xff\"}", "{}\xff"};
+  std::vector<extract::AttachedBytes> attachments;
   for (const std::string& row : rows) {
     Json::Value fields(Json::objectValue);
-    EXPECT_FALSE(ParseAnswer(row, fields)) << row.substr(0, 40) << " of " << row.size();
+    EXPECT_FALSE(ParseAnswer(row, fields, attachments)) << row.substr(0, 40) << " of " << row.size();
     EXPECT_TRUE(fields.empty());
   }
+}
+
+TEST(AnswerTest, AttachmentsLieBehindEachOtherInTheRegion) {
+  const auto listed = [](const std::string& list) {
+    Json::Value fields(Json::objectValue);
+    std::vector<extract::AttachedBytes> attachments;
+    EXPECT_TRUE(ParseAnswer("{\"attachments\":" + list + "}", fields, attachments)) << list;
+    EXPECT_TRUE(fields.empty()) << list;
+    std::string text;
+    for (const auto& one : attachments) {
+      text += one.name + " " + std::to_string(one.offset) + "+" + std::to_string(one.bytes) + "\n";
+    }
+    return text;
+  };
+  EXPECT_EQ("a.pdf 1048576+10\nb 1048586+5\n", listed(R"([{"name":"a.pdf","bytes":10},{"name":"b","bytes":5}])"));
+  EXPECT_EQ("a 1048576+15728640\n", listed(R"([{"name":"a","bytes":15728640},{"name":"b","bytes":1}])"));
+  const std::string long_name(2000, 'x');
+  for (const std::string first : {R"({"name":"a","bytes":15728641})", R"({"name":"a","bytes":-1})", R"({"bytes":1})",
+                                  R"({"name":1,"bytes":1})", "7"}) {
+    EXPECT_EQ("", listed("[" + first + R"(,{"name":"b","bytes":1}])")) << first;
+  }
+  EXPECT_EQ("", listed("[{\"name\":\"" + long_name + "\",\"bytes\":1}]"));
+  EXPECT_EQ("", listed(R"({"name":"a","bytes":1})"));
 }
 
 /// A worker's region that holds `text` at its beginning.

@@ -1,15 +1,49 @@
 """How the index depends on content extraction: it waits for it, uses it again, and does not trust it."""
 
 import json
+import io
 import os
 import re
 import signal
 import unittest
+import zipfile
+from email.message import EmailMessage
 
 from instance import BIN, InstanceTestCase, wait_for, write
 
 DAEMON = "kovacontentextractd"
 NOBODY = 65534
+
+
+def office_document(word):
+    """The least that is a DOCX."""
+    office = "http://schemas.openxmlformats.org"
+    buffer = io.BytesIO()
+    with zipfile.ZipFile(buffer, "w") as file:
+        file.writestr("_rels/.rels", f'<Relationships xmlns="{office}/package/2006/relationships"><Relationship Id="1" '
+                      f'Type="{office}/officeDocument/2006/relationships/officeDocument" Target="word/document.xml"/>'
+                      '</Relationships>')
+        file.writestr("word/document.xml", f'<w:document xmlns:w="{office}/wordprocessingml/2006/main"><w:body><w:p>'
+                      f'<w:r><w:t>{word}</w:t></w:r></w:p></w:body></w:document>')
+    return buffer.getvalue()
+
+
+def pdf(word):
+    objects = ["<</Type/Catalog/Pages 2 0 R>>", "<</Type/Pages/Kids[3 0 R]/Count 1>>",
+               "<</Type/Page/Parent 2 0 R/MediaBox[0 0 300 99]/Contents 4 0 R/Resources<</Font<</F 5 0 R>>>>>>",
+               f"<</Length {len(word) + 30}>>stream\nBT /F 12 Tf 9 9 Td ({word}) Tj ET\nendstream",
+               "<</Type/Font/Subtype/Type1/BaseFont/Helvetica>>"]
+    body = "".join(f"{number} 0 obj{text}endobj\n" for number, text in enumerate(objects, 1))
+    return f"%PDF-1.4\n{body}trailer<</Root 1 0 R>>\n".encode()
+
+
+def mail(text, **attachments):
+    message = EmailMessage()
+    message["Subject"] = "hangar"
+    message.set_content(text)
+    for name, content in attachments.items():
+        message.add_attachment(content, maintype="application", subtype="octet-stream", filename=name)
+    return message
 
 
 class ExtractionTest(InstanceTestCase):
@@ -140,6 +174,22 @@ class ExtractionTest(InstanceTestCase):
                          [(line["path"], line["reason"]) for line in lines])
         self.assertEqual(f"{folder}/b\\x0A.pdf\n    damaged\n{folder}/c.pdf\n    damaged\n", self.ctl("unread").decode())
         self.assertIn(b"all: fileindexctl unread docs", self.commit_and_status())
+
+    def test_attachments_are_read_by_the_readers_of_their_kinds(self):
+        outer = mail("zeppelin", **{"plan.docx": office_document("balloon"), "plan": pdf("glider"), "cut.docx": b"PK\3\4"})
+        outer.attach(mail("gyrocopter", **{"inner.docx": office_document("helicopter")}))
+        outer.add_attachment(mail("ornithopter", **{"deep.docx": office_document("autogyro")}).as_bytes(),
+                             maintype="application", subtype="octet-stream", filename="saved.eml")
+        self.ctl("up")
+        folder = self.instance.add_share("docs", "--no-index")
+        write(f"{folder}/outer.eml", outer.as_bytes())
+        self.ctl("folder", "add", "/docs")
+        self.instance.wait_idle("docs", folder)
+        found = {word for word in ("zeppelin", "balloon", "glider", "gyrocopter", "helicopter", "ornithopter", "autogyro",
+                                   "deep") if self.instance.search(word)}
+        self.assertEqual({"zeppelin", "balloon", "glider", "gyrocopter", "helicopter", "ornithopter", "deep"}, found)
+        self.assertEqual({"outer.eml": {"_KOVAExtractError": "attachment: damaged", "KOVAMDTitle": "hangar"}},
+                         self.fields(folder, "_KOVAExtractError", "KOVAMDTitle"))
 
     def commit_and_status(self):
         self.instance.ask("kovaelasticd", {"command": "commit", "data": {"id": "fileindex_docs"}})

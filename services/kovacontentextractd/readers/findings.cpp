@@ -2,6 +2,7 @@
 #include <cmath>
 #include <cstring>
 #include <string>
+#include <utility>
 
 #include "services/kovacontentextractd/readers/reader.h"
 #include "services/kovacontentextractd/readers/utf8.h"
@@ -14,6 +15,8 @@ namespace {
 constexpr size_t kFieldMaxBytes = 32U << 10;
 /// Values of lists, of all fields together: each is compared with those before it.
 constexpr int kAppendMax = 50000;
+/// Of an attachment's name, the end: what matters of it is the extension.
+constexpr size_t kNameMaxBytes = 255;
 constexpr std::string_view kBetweenValues = ", ";
 constexpr std::string_view kReplacement = "\xEF\xBF\xBD";
 constexpr std::string_view kBlanks("\0 \t\r\n\v\f", 7);
@@ -98,6 +101,18 @@ void Findings::SetInteger(const char* field, int64_t value) { fields_[field] = J
 
 void Findings::SetNumber(const char* field, double value) {
   if (std::isfinite(value)) fields_[field] = value;
+}
+
+size_t Findings::AttachmentRoom() const {
+  return attachments_.size() < limits_.attachments ? limits_.attached_bytes - attached_bytes_ : 0;
+}
+
+void Findings::Attach(Attachment attachment) {
+  if (attachment.bytes.empty() || attachment.bytes.size() > AttachmentRoom()) return;
+  attached_bytes_ += attachment.bytes.size();
+  const size_t begin = attachment.name.size() - std::min(attachment.name.size(), kNameMaxBytes);
+  attachment.name = FieldValue(std::string_view(attachment.name).substr(begin));
+  attachments_.push_back(std::move(attachment));
 }
 
 void Findings::Fail(std::string_view reason) {

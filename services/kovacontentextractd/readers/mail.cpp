@@ -3,6 +3,7 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <array>
 #include <gmime/gmime.h>
 #include <memory>
 #include <string>
@@ -147,7 +148,7 @@ class MailReader {
   bool AddMultipart(GMimeMultipart* multipart, int level) {
     GMimeContentType* type = g_mime_object_get_content_type(GMIME_OBJECT(multipart));
     const int count = std::min(g_mime_multipart_get_count(multipart), kPartsMax);
-    if (g_mime_content_type_is_type(type, "multipart", "alternative") != FALSE) {
+    if (Is(type, "multipart", "alternative")) {
       if (GMimeObject* plain = PlainAlternative(multipart, count)) return AddAlternatives(multipart, plain, level);
     }
     for (int i = 0; i < count; ++i) {
@@ -160,7 +161,7 @@ class MailReader {
     for (int i = 0; i < count; ++i) {
       GMimeObject* part = g_mime_multipart_get_part(multipart, i);
       GMimeContentType* type = g_mime_object_get_content_type(part);
-      if (g_mime_content_type_is_type(type, "text", "plain") != FALSE) return part;
+      if (Is(type, "text", "plain")) return part;
     }
     return nullptr;
   }
@@ -185,23 +186,36 @@ class MailReader {
     const std::string_view name = View(g_mime_part_get_filename(part));
     AddLine(name);
     GMimeContentType* type = g_mime_object_get_content_type(GMIME_OBJECT(part));
-    if (g_mime_content_type_is_type(type, "text", "*") == FALSE) return true;
-    const std::string bytes = Unpacked(part);
+    if (!Is(type, "text", "*") || Is(type, "text", "rtf") || Is(type, "text", "xml")) {
+      Attach(part, type, name);
+      return true;
+    }
+    const std::string bytes = Unpacked(part, kPartMaxBytes);
     const char* charset = g_mime_object_get_content_type_parameter(GMIME_OBJECT(part), "charset");
     DecodedText decoded;
     const bool cut = bytes.size() == kPartMaxBytes;
     if (!Decode(bytes, cut, std::string(View(charset)), decoded)) return true;
-    if (g_mime_content_type_is_type(type, "text", "html") != FALSE) {
-      decoded.text = ReadHtml(decoded.text, findings_.Bounds().text_bytes).text;
-    }
+    if (Is(type, "text", "html")) decoded.text = ReadHtml(decoded.text, findings_.Bounds().text_bytes).text;
     if (plain_bytes_ > 0 && decoded.text.size() <= 2 * plain_bytes_) return true;
     const bool more = findings_.AddText(decoded.text);
     findings_.Break();
     return more;
   }
 
-  /// The part's content without its transfer encoding.
-  static std::string Unpacked(GMimePart* part) {
+  static bool Is(GMimeContentType* type, const char* kind, const char* subtype) {
+    return g_mime_content_type_is_type(type, kind, subtype) != FALSE;
+  }
+
+  /// Hands on what is no text itself, but may have some. What is too large is cut off, and so dropped.
+  void Attach(GMimePart* part, GMimeContentType* type, std::string_view name) {
+    const bool has_none = Is(type, "image", "*") || Is(type, "audio", "*") || Is(type, "video", "*");
+    const size_t room = findings_.AttachmentRoom();
+    if (has_none || room == 0 || depth_ >= findings_.Bounds().nesting) return;
+    findings_.Attach({std::string(name), Unpacked(part, room + 1)});
+  }
+
+  /// The part's content without its transfer encoding, at most so many bytes.
+  static std::string Unpacked(GMimePart* part, size_t limit_bytes) {
     GMimeDataWrapper* content = g_mime_part_get_content(part);
     GMimeStream* packed = content != nullptr ? g_mime_data_wrapper_get_stream(content) : nullptr;
     if (packed == nullptr) return {};
@@ -209,14 +223,14 @@ class MailReader {
     const Ref<GMimeStream> stream(g_mime_stream_filter_new(packed));
     const Ref<GMimeFilter> filter(g_mime_filter_basic_new(g_mime_data_wrapper_get_encoding(content), FALSE));
     (void)g_mime_stream_filter_add(GMIME_STREAM_FILTER(stream.get()), filter.get());
-    std::string bytes(kPartMaxBytes, '\0');
-    size_t have = 0;
-    while (have < bytes.size()) {
-      const ssize_t got = g_mime_stream_read(stream.get(), bytes.data() + have, bytes.size() - have);
+    std::string bytes;
+    std::array<char, 16384> piece;
+    while (bytes.size() < limit_bytes) {
+      const size_t wanted = std::min(piece.size(), limit_bytes - bytes.size());
+      const ssize_t got = g_mime_stream_read(stream.get(), piece.data(), wanted);
       if (got <= 0) break;
-      have += static_cast<size_t>(got);
+      bytes.append(piece.data(), static_cast<size_t>(got));
     }
-    bytes.resize(have);
     return bytes;
   }
 

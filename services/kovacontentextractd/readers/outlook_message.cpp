@@ -46,13 +46,16 @@ void AddRecipientAddresses(const CompoundFile& file, Findings& findings) {
   }
 }
 
-/// The names of what is attached.
+/// Each has a storage of its own.
 void AddAttachments(const CompoundFile& file, Findings& findings) {
   for (const uint32_t attachment : file.Storages("__attach_version1.0")) {
     std::string name = TextOf(file, "3707", attachment);
     if (name.empty()) name = TextOf(file, "3704", attachment);
     findings.Break();
-    (void)findings.AddText(name);
+    if (!findings.AddText(name)) return;
+    const auto content = file.Open("__substg1.0_37010102", attachment);
+    if (content == nullptr || content->Size() > findings.AttachmentRoom()) continue;
+    findings.Attach({name, content->ReadAt(0, static_cast<size_t>(content->Size()))});
   }
 }
 

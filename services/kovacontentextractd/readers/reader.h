@@ -4,6 +4,7 @@
 #include <cstdint>
 #include <string>
 #include <string_view>
+#include <vector>
 
 #include <json/value.h>
 
@@ -19,6 +20,14 @@ struct Limits {
   uint64_t expansion_ratio = 100;       ///< beyond them, unpacked bytes for each packed one
   uint64_t member_bytes = 50ULL << 20;  ///< of one member of an archive or container, unpacked
   int nesting = 2;                      ///< of files in files
+  size_t attachments = 50;              ///< files in it that are handed on
+  size_t attached_bytes = 15U << 20;    ///< of all of them
+};
+
+/// A file within the file, which the reader of its own kind is to read.
+struct Attachment {
+  std::string name;  ///< for hints
+  std::string bytes;
 };
 
 /// One file to read. The descriptor is open for reading, can seek, and is not the reader's to close.
@@ -51,12 +60,18 @@ class Findings {
   void SetInteger(const char* field, int64_t value);
   void SetNumber(const char* field, double value);
 
+  /// How many bytes an attachment may have now; 0 when no more are taken.
+  size_t AttachmentRoom() const;
+  /// Hands a file within this one on. What is beyond the limits is dropped.
+  void Attach(Attachment attachment);
+
   /// The reason why the content, or a part of it, could not be read, in a few words ("encrypted", "damaged",
   /// "expands to too much"). The first one counts; what was found besides is kept.
   void Fail(std::string_view reason);
 
   bool HasText() const { return !text_.empty(); }
   const std::string& Text() const { return text_; }
+  const std::vector<Attachment>& Attachments() const { return attachments_; }
   /// The document's members but the text: the fields, "_KOVATextCut", "_KOVAExtractError".
   Json::Value ToFields() const;
   /// All of them: the text is "KOVAMDTextContent".
@@ -68,6 +83,8 @@ class Findings {
   bool cut_ = false;
   int appended_ = 0;  ///< values of lists
   std::string failure_;
+  std::vector<Attachment> attachments_;
+  size_t attached_bytes_ = 0;
   Json::Value fields_ = Json::Value(Json::objectValue);
 };
 
