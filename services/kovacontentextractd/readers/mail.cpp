@@ -151,10 +151,11 @@ class MailReader {
     if (Is(type, "multipart", "alternative")) {
       if (GMimeObject* plain = PlainAlternative(multipart, count)) return AddAlternatives(multipart, plain, level);
     }
-    for (int i = 0; i < count; ++i) {
-      if (!AddObject(g_mime_multipart_get_part(multipart, i), level + 1)) return false;
-    }
-    return true;
+    const bool outer = std::exchange(in_page_, in_page_ || Is(type, "multipart", "related"));
+    bool more = true;
+    for (int i = 0; more && i < count; ++i) more = AddObject(g_mime_multipart_get_part(multipart, i), level + 1);
+    in_page_ = outer;
+    return more;
   }
 
   static GMimeObject* PlainAlternative(GMimeMultipart* multipart, int count) {
@@ -208,6 +209,8 @@ class MailReader {
 
   /// Hands on what is no text itself, but may have some. What is too large is cut off, and so dropped.
   void Attach(GMimePart* part, GMimeContentType* type, std::string_view name) {
+    const std::string_view disposition = View(g_mime_object_get_disposition(GMIME_OBJECT(part)));
+    if (in_page_ && disposition != GMIME_DISPOSITION_ATTACHMENT) return;  // what a page is made of: styles, scripts
     const bool has_none = Is(type, "image", "*") || Is(type, "audio", "*") || Is(type, "video", "*");
     const size_t room = findings_.AttachmentRoom();
     if (has_none || room == 0 || depth_ >= findings_.Bounds().nesting) return;
@@ -244,6 +247,7 @@ class MailReader {
   bool is_box_;
   int depth_;
   int parts_ = 0;
+  bool in_page_ = false;    ///< among the parts of one page
   size_t plain_bytes_ = 0;  ///< of the plain form of what is read, where there is one; 0 where there is none
   std::string encoding_;    ///< of headers that are bytes outside ASCII and not UTF-8; empty for Latin-1
 };
