@@ -264,6 +264,7 @@ XmlTokenizer::Token XmlTokenizer::ReadCData() {
 
 XmlTokenizer::Token XmlTokenizer::ReadMarkup() {
   text_ = {};
+  if (Has(2) && buffer_[begin_ + 1] != '!' && buffer_[begin_ + 1] != '?') return ReadTag();
   if (StartsWith("<!--"sv)) {
     (void)SkipPast("-->"sv);
   } else if (StartsWith("<![CDATA["sv)) {
@@ -332,8 +333,11 @@ XmlTokenizer::Token XmlTokenizer::CloseElement() {
 
 void XmlTokenizer::ReadName(std::string& name) {
   name.clear();
-  for (; Has(1) && !EndsName(buffer_[begin_]); ++begin_) {
-    if (name.size() < kNameMaxBytes) name += buffer_[begin_];
+  while (Has(1) && !EndsName(buffer_[begin_])) {
+    const std::string_view rest = Rest();
+    const auto size = static_cast<size_t>(std::find_if(rest.begin(), rest.end(), &EndsName) - rest.begin());
+    name.append(rest.substr(0, std::min(size, kNameMaxBytes - name.size())));
+    begin_ += size;
   }
 }
 

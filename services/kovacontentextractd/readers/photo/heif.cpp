@@ -92,11 +92,11 @@ std::string ItemBytes(std::string_view file, std::string_view meta, uint64_t wan
     const bool in_data_box = version > 0 && (places.Number(2) & 15) == 1;
     (void)places.Number(2);
     const uint64_t base = places.Number(base_size);
-    const std::string_view from = in_data_box ? ContentOf(meta, "idat"sv) : file;
     const uint64_t count = places.Number(2);
-    Bytes pieces(
-        places.Take(count * (index_size + offset_size + length_size)));  // that may be none, so often it is told
+    // Where a piece is told by nothing, it takes no bytes here, however many there are.
+    Bytes pieces(places.Take(count * (index_size + offset_size + length_size)));
     if (number != wanted) continue;
+    const std::string_view from = in_data_box ? ContentOf(meta, "idat"sv) : file;
     std::string bytes;
     while (!pieces.Ended() && bytes.size() <= kPartMaxBytes) {
       (void)pieces.Number(index_size);
