@@ -20,8 +20,9 @@ namespace {
 using SteadyClock = std::chrono::steady_clock;
 using std::chrono::milliseconds;
 
-/// For a process that was killed to be gone.
-constexpr milliseconds kEndMax(2000);
+/// For a process that was killed to be gone. One that used much memory takes seconds where the machine swaps; who takes
+/// it for held by a file system lets its file wait instead of blaming it.
+constexpr milliseconds kEndMax(10000);
 constexpr int kPollMs = 1;
 
 struct HeldProcesses {
