@@ -12,6 +12,17 @@ CORPUS = os.environ.get("FERROX_CORPUS", "")
 SHARE = "corpus"
 TYPE, ERROR = "KOVAMDContentType", "_KOVAExtractError"
 INDEX_SECONDS = 900
+#: What people type to search for a field.
+QUERY_WORDS = {
+    "KOVAMDTitle": "title", "KOVAMDAuthors": "author", "KOVAMDContributors": "author", "KOVAMDComposer": "composer",
+    "KOVAMDAlbum": "album", "KOVAMDMusicalGenre": "genre", "KOVAMDComment": "comment", "KOVAMDDescription": "description",
+    "KOVAMDKeywords": "keyword", "KOVAMDCopyright": "copyright", "KOVAMDCodecs": "codec", "KOVAMDOrganizations": "publisher",
+    "KOVAMDAcquisitionMake": "camera", "KOVAMDAcquisitionModel": "camera", "KOVAMDCity": "place", "KOVAMDCountry": "place",
+    "KOVAMDNamedLocation": "place", "KOVAMDPeopleDisplayName": "person", "KOVAMDAuthorAddresses": "from",
+    "KOVAMDRecipients": "to", "KOVAMDRecipientAddresses": "to", "KOVAMDEncodingApplications": "program",
+    "KOVAMDPixelWidth": "width", "KOVAMDPixelHeight": "height", "KOVAMDNumberOfPages": "pages", "KOVAMDISOSpeed": "iso",
+    "KOVAMDAudioTrackNumber": "track", "KOVAMDRecordingYear": "year", "KOVAMDDurationSecond": "duration",
+}
 
 
 def is_as(expected, value):
@@ -22,6 +33,18 @@ def is_as(expected, value):
         return expected.get("min", float("-inf")) <= float(value) <= expected.get("max", float("inf"))
     except (TypeError, ValueError):
         return False
+
+
+def query_of(name, value):
+    """The search for a field's value; nothing where it has none, or no word is for it."""
+    if value is None or name not in QUERY_WORDS:
+        return None
+    if isinstance(value, dict):
+        low, high = (f"{value[bound]:.0f}" if bound in value else "" for bound in ("min", "max"))
+        value = f"{low}..{high}" if low and high else f">={low}" if low else f"<={high}"
+    elif isinstance(value, str):
+        value = '"' + value.replace('"', " ") + '"'
+    return f"{QUERY_WORDS[name]}:{value}"
 
 
 class CorpusTest(InstanceTestCase):
@@ -49,10 +72,11 @@ class CorpusTest(InstanceTestCase):
         return [f"{name}: expected {value!r}, got {document.get(name)!r}" for name, value in expected.items()
                 if not is_as(value, document.get(name))]
 
-    def faults_of_words(self, entry):
+    def faults_of_searches(self, entry):
         path = os.fsencode(f"{self.folder}/{entry['path']}")
-        return [f"word {word!r}: not found" for word in entry["words"]
-                if path not in self.instance.search("--share", SHARE, word)]
+        queries = [query_of(name, value) for name, value in entry["fields"].items()]
+        return [f"search for {query!r}: not found" for query in entry["words"] + list(filter(None, queries))
+                if path not in self.instance.search("--share", SHARE, query)]
 
     def test_everything_listed_is_found(self):
         documents = self.documents()
@@ -60,7 +84,7 @@ class CorpusTest(InstanceTestCase):
         def faults_of(entry):
             document = documents.get(f"{self.folder}/{entry['path']}")
             found = ["no document"] if document is None else self.faults_of_fields(entry, document)
-            return [f"{entry['path']}: {fault}" for fault in found + self.faults_of_words(entry)]
+            return [f"{entry['path']}: {fault}" for fault in found + self.faults_of_searches(entry)]
         with ThreadPoolExecutor(os.cpu_count()) as threads:
             faults = [fault for found in threads.map(faults_of, self.files) for fault in found]
         self.assertTrue(self.files)
