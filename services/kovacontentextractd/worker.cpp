@@ -60,6 +60,7 @@ std::string ToText(const Json::Value& value) {
     return std::unique_ptr<Json::StreamWriter>(builder.newStreamWriter());
   }();
   std::ostringstream text;
+  text.exceptions(std::ios::badbit);  // else a text that memory was too short for would be cut off unnoticed
   (void)writer->write(value, &text);
   return text.str();
 }

@@ -9,7 +9,7 @@ import unittest
 import zipfile
 from email.message import EmailMessage
 
-from instance import BIN, InstanceTestCase, wait_for, write
+from instance import BIN, InstanceTestCase, children, process_facts, wait_for, write
 
 DAEMON = "kovacontentextractd"
 NOBODY = 65534
@@ -61,14 +61,6 @@ class ExtractionTest(InstanceTestCase):
     def fields(self, folder, *names):
         return {os.path.basename(entry["KOVAMDPath"]): {name: entry.get(name) for name in names}
                 for entry in self.instance.entries("docs", folder, "KOVAMDPath", *names)}
-
-    def child_pids(self):
-        pid = self.instance.pid(DAEMON)
-        found = []
-        for task in os.listdir(f"/proc/{pid}/task"):
-            with open(f"/proc/{pid}/task/{task}/children", encoding="ascii") as file:
-                found += [int(child) for child in file.read().split()]
-        return found
 
     def test_indexing_waits_until_content_can_be_read(self):
         folder = self.indexed(a="zeppelin")
@@ -202,9 +194,8 @@ class ExtractionTest(InstanceTestCase):
         self.assertEqual((1, 0), (status["files"], status["blamed"]))
         self.assertRegex(self.ctl("status"), b"content extraction: runs, process [0-9]+, 1 of at most [0-9]+ workers, 1 files")
         workers = 0
-        for pid in self.child_pids():
-            with open(f"/proc/{pid}/status", encoding="ascii") as file:
-                facts = dict(line.split(":\t", 1) for line in file.read().splitlines() if ":\t" in line)
+        for pid in children(self.instance.pid(DAEMON)):
+            facts = process_facts(pid)
             if facts["NoNewPrivs"] == "0":
                 continue  # what workers are forked from
             workers += 1

@@ -19,7 +19,7 @@ import threading
 import time
 import unittest
 
-from instance import InstanceTestCase, wait_for
+from instance import InstanceTestCase, children, process_facts, wait_for
 
 sys.path.insert(0, os.path.join(os.path.dirname(os.path.abspath(__file__)), "..", "corpus"))
 import hostile  # noqa: E402
@@ -107,22 +107,6 @@ class Watch:
                     self.descriptors = max(self.descriptors, len(os.listdir(f"/proc/{worker}/fd")))
                 except (OSError, KeyError):
                     continue  # it has ended
-
-
-def children(pid):
-    found = []
-    try:
-        for task in os.listdir(f"/proc/{pid}/task"):
-            with open(f"/proc/{pid}/task/{task}/children", encoding="ascii") as file:
-                found += [int(child) for child in file.read().split()]
-    except OSError:
-        pass
-    return found
-
-
-def process_facts(pid):
-    with open(f"/proc/{pid}/status", encoding="utf-8") as file:
-        return dict(line.split(":\t", 1) for line in file.read().splitlines() if ":\t" in line)
 
 
 class HostileTest(InstanceTestCase):

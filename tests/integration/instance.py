@@ -168,6 +168,22 @@ class InstanceTestCase(unittest.TestCase):
         self.assertEqual([], left, "processes that 'down' left running")
 
 
+def children(pid):
+    found = []
+    try:
+        for task in os.listdir(f"/proc/{pid}/task"):
+            with open(f"/proc/{pid}/task/{task}/children", encoding="ascii") as file:
+                found += [int(child) for child in file.read().split()]
+    except OSError:
+        pass
+    return found
+
+
+def process_facts(pid):
+    with open(f"/proc/{pid}/status", encoding="utf-8") as file:
+        return dict(line.split(":\t", 1) for line in file.read().splitlines() if ":\t" in line)
+
+
 def write(path, text):
     os.makedirs(os.path.dirname(path), exist_ok=True)
     with open(path, "wb") as file:
