@@ -1,5 +1,8 @@
 #include <algorithm>
 #include <chrono>
+#include <iterator>
+#include <tuple>
+#include <utility>
 
 #include "common/clock.h"
 #include "common/error.h"
@@ -103,6 +106,27 @@ Json::Value HitJson(IndexHit& found) {
   return hit;
 }
 
+/// The first `wanted` hits of all indices. Each index's own order stays as it is, because the scores of one index do
+/// not fall steadily: always the best of the foremost hits comes next, of equals that of the index named first. So the
+/// hits before any place are the same however many are wanted.
+std::vector<IndexHit> Merge(std::vector<std::vector<IndexHit>> of_index, const SearchRequest& request, size_t wanted) {
+  std::vector<IndexHit> merged;
+  std::vector<size_t> next(of_index.size(), 0);
+  while (merged.size() < wanted) {
+    IndexHit* first = nullptr;
+    size_t from = 0;
+    for (size_t i = 0; i < of_index.size(); ++i) {
+      if (next[i] == of_index[i].size()) continue;
+      IndexHit& foremost = of_index[i][next[i]];
+      if (first == nullptr || ComesFirst(request, foremost, *first)) std::tie(first, from) = std::pair(&foremost, i);
+    }
+    if (first == nullptr) break;
+    merged.push_back(std::move(*first));
+    ++next[from];
+  }
+  return merged;
+}
+
 /// The page of a search over several indices: the best of each, merged.
 std::vector<IndexHit> SearchAll(const std::vector<Registry::OpenIndex>& indices, const SearchRequest& request,
                                 SearchReply& sums) {
@@ -111,21 +135,19 @@ std::vector<IndexHit> SearchAll(const std::vector<Registry::OpenIndex>& indices,
     each.offset = 0;
     each.limit = request.offset + request.limit;
   }
-  std::vector<IndexHit> hits;
+  std::vector<std::vector<IndexHit>> of_index;
   for (const Registry::OpenIndex& open : indices) {
     SearchReply reply = open.index->Search(each);
     sums.total += reply.total;
     sums.ranking_bounded = sums.ranking_bounded || reply.ranking_bounded;
+    std::vector<IndexHit>& hits = of_index.emplace_back();
     for (SearchHit& hit : reply.hits) hits.push_back({open.id, std::move(hit)});
     for (std::string& word : reply.suggestions) sums.suggestions.push_back(std::move(word));
   }
-  if (indices.size() <= 1) return hits;
-  std::stable_sort(hits.begin(), hits.end(),
-                   [&request](const IndexHit& a, const IndexHit& b) { return ComesFirst(request, a, b); });
-  const size_t first = std::min(hits.size(), static_cast<size_t>(request.offset));
-  const size_t end = std::min(hits.size(), first + static_cast<size_t>(request.limit));
-  return {std::make_move_iterator(hits.begin() + static_cast<ptrdiff_t>(first)),
-          std::make_move_iterator(hits.begin() + static_cast<ptrdiff_t>(end))};
+  if (of_index.size() == 1) return std::move(of_index.front());
+  std::vector<IndexHit> hits = Merge(std::move(of_index), request, static_cast<size_t>(each.limit));
+  hits.erase(hits.begin(), hits.begin() + std::min<ptrdiff_t>(request.offset, std::ssize(hits)));
+  return hits;
 }
 
 }  // namespace

@@ -11,7 +11,7 @@
 
 namespace ferrox::engine {
 
-/// One search over one snapshot of an index: finds the set of documents, orders the best of them, loads a page.
+/// One search over one snapshot of an index: finds the set of documents, orders them, loads a page.
 class Searcher {
  public:
   Searcher(StoreReader& reader, const SearchRequest& request) : reader_(reader), request_(request) {}
@@ -56,7 +56,9 @@ class Searcher {
   static void ForEachCandidateHit(const std::vector<Candidate>& candidates, const std::vector<WordHit>& hits,
                                   Take take);
   void ScoreAtFirstSight(std::vector<Candidate>& candidates, std::vector<uint8_t>& counts);
-  static std::vector<size_t> BestPlaces(const std::vector<Candidate>& candidates, size_t top);
+  static std::vector<size_t> PlacesBetween(const std::vector<Candidate>& candidates, size_t begin, size_t end);
+  std::vector<Ranked> RankBlock(const std::vector<Candidate>& candidates, const std::vector<uint8_t>& counts,
+                                size_t begin, size_t end);
   double CloseScore(const Candidate& candidate, const uint8_t* counts);
   double LengthFactor(int64_t id, double& freshness);
   std::vector<Ranked> OrderByColumn(const DocSet& documents, int64_t total);
