@@ -22,17 +22,10 @@ void CheckReadable(const std::string& path) {
   throw Failure(path + ": " + (there ? "not a file" : strerror(errno)) + "; give the path of a share's queue file");
 }
 
-/// The operation's own text, exactly, unless it would not stay one line.
 void PrintText(const OpPtr& op) {
-  std::ostringstream stream;
-  stream << op;
-  const std::string text = stream.str();
-  std::string safe;
-  for (const char byte : text) {
-    const auto code = static_cast<unsigned char>(byte);
-    safe += code < 0x20 || code == 0x7F ? EscapeForTerminal({&byte, 1}) : std::string(1, byte);
-  }
-  (void)printf("%s\n", safe.c_str());
+  std::ostringstream text;
+  text << op;
+  (void)printf("%s\n", EscapeForTerminal(text.str()).c_str());
 }
 
 /// The members stand in this order, so that the lines can also be read by eye.

@@ -1,3 +1,5 @@
+#include <unistd.h>
+
 #include <algorithm>
 #include <cstdio>
 #include <iterator>
@@ -117,7 +119,10 @@ bool Show(const std::string& file, const Arguments& arguments) {
   const Json::Value texts = Entries(share, QueryOf(path, kTextField));
   const std::string text = texts.empty() ? "" : TextOf(texts[0], kTextField);
   if (arguments.Has("--text")) {
-    if (fwrite(text.data(), 1, text.size(), stdout) != text.size()) throw Failure("standard output cannot be written");
+    const std::string shown = isatty(STDOUT_FILENO) == 1 ? EscapeText(text) : text;  // a file gets it as it was read
+    if (fwrite(shown.data(), 1, shown.size(), stdout) != shown.size()) {
+      throw Failure("standard output cannot be written");
+    }
   } else if (arguments.Has("--json")) {
     if (!text.empty()) documents[0][kTextField] = text;
     (void)printf("%s\n", ToScriptJson(documents[0]).c_str());

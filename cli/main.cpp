@@ -96,7 +96,7 @@ int main(int argc, char** argv) {
     if (fflush(stdout) != 0) throw Failure("standard output cannot be written");
     return code;
   } catch (const UsageError& error) {
-    (void)fprintf(stderr, "fileindexctl: %s\nTry 'fileindexctl --help'.\n", error.what());
+    (void)fprintf(stderr, "fileindexctl: %s\nTry 'fileindexctl --help'.\n", EscapeText(error.what()).c_str());
     return kWrongUsage;
   } catch (const ferrox::Error& error) {
     (void)fprintf(stderr, "fileindexctl: %s\n", EscapeForTerminal(Explain(error)).c_str());

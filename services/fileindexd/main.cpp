@@ -5,6 +5,8 @@
 #include <cstdlib>
 #include <exception>
 
+#include <kova/log.h>
+
 #include "common/paths.h"
 #include "platform/host/mounts.h"
 #include "platform/host/share_table.h"
@@ -65,6 +67,6 @@ int main(int argc, char** argv) try {
   server.Run(daemon.StopFd());
   return 0;
 } catch (const std::exception& error) {
-  (void)fprintf(stderr, "fileindexd: %s\n", error.what());
+  (void)fprintf(stderr, "fileindexd: %s\n", kova::WithoutControlCharacters(error.what()).c_str());
   return 3;
 }

@@ -3,6 +3,8 @@
 #include <cstdio>
 #include <cstring>
 
+#include <kova/log.h>
+
 #include "common/error.h"
 #include "common/paths.h"
 #include "services/kovacontentextractd/extractor.h"
@@ -79,7 +81,7 @@ int main(int argc, char** argv) {
     Serve();
     return 0;
   } catch (const std::exception& error) {
-    (void)fprintf(stderr, "kovacontentextractd: %s\n", error.what());
+    (void)fprintf(stderr, "kovacontentextractd: %s\n", kova::WithoutControlCharacters(error.what()).c_str());
     return 3;
   }
 }

@@ -3,6 +3,8 @@
 #include <cstdio>
 #include <cstring>
 
+#include <kova/log.h>
+
 #include "common/error.h"
 #include "common/paths.h"
 #include "services/kovaelasticd/engine.h"
@@ -57,7 +59,7 @@ int main(int argc, char** argv) {
     Serve();
     return 0;
   } catch (const std::exception& error) {
-    (void)fprintf(stderr, "kovaelasticd: %s\n", error.what());
+    (void)fprintf(stderr, "kovaelasticd: %s\n", kova::WithoutControlCharacters(error.what()).c_str());
     return 3;
   }
 }

@@ -5,6 +5,8 @@
 #include <exception>
 #include <thread>
 
+#include <kova/log.h>
+
 #include "common/paths.h"
 #include "common/scope_exit.h"
 #include "platform/host/configuration.h"
@@ -86,6 +88,6 @@ int main(int argc, char** argv) try {
   notifier.Run(daemon.StopFd());
   return 0;
 } catch (const std::exception& error) {
-  (void)fprintf(stderr, "kovanotifyd: %s\n", error.what());
+  (void)fprintf(stderr, "kovanotifyd: %s\n", kova::WithoutControlCharacters(error.what()).c_str());
   return 3;
 }

@@ -138,6 +138,7 @@ class ToolTest(unittest.TestCase):
         rows = [
             (2, "Try", []),
             (2, "no command", ["nonsense", "add"]),
+            (2, r"unknown option --\x1B[2J\xE2\x80\xAE", ["search", "--\x1b[2J\u202e"]),
             (2, "add, delete, get", ["folder", "nonsense"]),
             (2, "--kinds takes", ["folder", "add", "--kinds", "music", "/photo"]),
             (2, "--kinds is needed", ["folder", "set", "/photo"]),

@@ -42,9 +42,9 @@ TEST(FailTest, LogsConditionReasonAndErrnoThenThrows) {
 
 TEST(LogTest, NoTextCanForgeALine) {
   const test::LogCapture log;
-  Log(LOG_ERR, "name=%s", "a\nb\x1b[2J\x7f %s \xc3\xa4");
+  Log(LOG_ERR, "name=%s", "a\nb\x1b[2J\x7f\xc2\x9b\xe2\x80\xae\xff %s \xc3\xa4");
   Log(LOG_ERR, "%s", std::string(20000, 'x').c_str());
-  EXPECT_EQ(log.Lines()[0], "name=a\\x0ab\\x1b[2J\\x7f %s \xc3\xa4");
+  EXPECT_EQ(log.Lines()[0], "name=a\\x0ab\\x1b[2J\\x7f\\xc2\\x9b\\xe2\\x80\\xae\\xff %s \xc3\xa4");
   EXPECT_EQ(log.Lines()[1].size(), 8191U);
 }
 

@@ -177,7 +177,7 @@ class DaemonsTest(InstanceTestCase):
         write(path, text + b"bad line\n")
         done = self.instance.run("queue", "show", path)
         self.assertEqual(b"[02] /v/s/a\\x0Ab\n[05] /v/s/f -> /v/s/g\n[02] /v/s/g\n"
-                         b'[04] /v/s/d, data={"audio":true}\n[02] /v/s/\xff\n', done.stdout)
+                         b'[04] /v/s/d, data={"audio":true}\n[02] /v/s/\\xFF\n', done.stdout)
         self.assertEqual((0, b"6\n"), (done.returncode, done.stderr))
         shown = [json.loads(line) for line in self.ctl("queue", "show", "--json", path).splitlines()]
         self.assertEqual({"op": 2, "node": "/v/s/a\nb", "path": "", "data": None}, shown[0])

@@ -1,26 +1,14 @@
 #pragma once
 
-#include <cstdio>
 #include <string>
 #include <string_view>
 
+#include <kova/text.h>
+
 namespace kova {
 
-/// The text with each control character as \xNN, so that no file name can forge a line of the log.
-inline std::string WithoutControlCharacters(std::string_view text) {
-  std::string out;
-  out.reserve(text.size());
-  for (const char c : text) {
-    const auto byte = static_cast<unsigned char>(c);
-    if (byte >= 0x20 && byte != 0x7f) {
-      out += c;
-    } else {
-      char escaped[5];
-      (void)snprintf(escaped, sizeof(escaped), "\\x%02x", static_cast<unsigned>(byte));
-      out += escaped;
-    }
-  }
-  return out;
-}
+/// The text with each control character as \xNN, so that no file name can forge a line of the log or steer the terminal
+/// that shows it; and so each byte that is not UTF-8.
+inline std::string WithoutControlCharacters(std::string_view text) { return WithoutControls(text, "\\x%02x"); }
 
 }  // namespace kova
