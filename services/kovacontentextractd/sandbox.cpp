@@ -2,6 +2,8 @@
 
 #include <fcntl.h>
 #include <grp.h>
+#include <linux/capability.h>
+#include <linux/futex.h>
 #include <linux/landlock.h>
 #include <seccomp.h>
 #include <sys/mman.h>
@@ -14,6 +16,8 @@
 #include <cerrno>
 #include <cstdint>
 #include <memory>
+
+#include "services/kovacontentextractd/worker_protocol.h"
 
 namespace ferrox::extract {
 
@@ -38,12 +42,16 @@ bool LimitResources() {
   return memory && files && time && Limit(RLIMIT_NPROC, 0);
 }
 
-/// Whoever may change users becomes nobody, below an empty root. Everybody else has nothing to give up.
-bool BecomeNobody(const char* empty_folder) {
-  if (geteuid() != 0) return true;
-  const bool rooted = empty_folder == nullptr || chroot(empty_folder) == 0;
-  return chdir("/") == 0 && setgroups(0, nullptr) == 0 && setresgid(kNobody, kNobody, kNobody) == 0 &&
-         setresuid(kNobody, kNobody, kNobody) == 0 && rooted;
+bool BecomeUser(uid_t user) { return setresgid(user, user, user) == 0 && setresuid(user, user, user) == 0; }
+
+/// Above all numbers that hosts and user namespaces give out. Each template has another, so that its workers can do
+/// nothing to those of others, nor to what else runs as the user "nobody".
+uid_t OwnUser() { return 0x80000000U + static_cast<uid_t>(getpid()); }
+
+bool DropCapabilities() {
+  __user_cap_header_struct header = {_LINUX_CAPABILITY_VERSION_3, 0};
+  const __user_cap_data_struct none[_LINUX_CAPABILITY_U32S_3] = {};
+  return syscall(SYS_capset, &header, none) == 0;
 }
 
 bool YieldToOthers() {
@@ -74,65 +82,81 @@ bool CloseFileSystem() {
 
 /// What the C library and the readers' libraries need to compute, and to read and answer.
 constexpr int kAllowed[] = {
-    SCMP_SYS(read),
-    SCMP_SYS(pread64),
-    SCMP_SYS(readv),
-    SCMP_SYS(write),
-    SCMP_SYS(writev),
-    SCMP_SYS(recvmsg),
-    SCMP_SYS(close),
-    SCMP_SYS(dup),
-    SCMP_SYS(lseek),
-    SCMP_SYS(_llseek),
-    SCMP_SYS(fstat),
-    SCMP_SYS(fstat64),
-    SCMP_SYS(fcntl),
-    SCMP_SYS(fcntl64),
+    SCMP_SYS(read),          SCMP_SYS(pread64),
+    SCMP_SYS(readv),         SCMP_SYS(write),
+    SCMP_SYS(writev),        SCMP_SYS(close),
+    SCMP_SYS(dup),           SCMP_SYS(lseek),
+    SCMP_SYS(_llseek),       SCMP_SYS(fstat),
     SCMP_SYS(munmap),
-    SCMP_SYS(mremap),
-    SCMP_SYS(brk),
-    SCMP_SYS(madvise),
-    SCMP_SYS(futex),
-    SCMP_SYS(futex_time64),
-    SCMP_SYS(rt_sigaction),
-    SCMP_SYS(rt_sigprocmask),
-    SCMP_SYS(rt_sigreturn),
-    SCMP_SYS(sigreturn),
-    SCMP_SYS(getpid),
-    SCMP_SYS(gettid),
-    SCMP_SYS(clock_gettime),
-    SCMP_SYS(clock_gettime64),
-    SCMP_SYS(gettimeofday),
-    SCMP_SYS(getrandom),
-    SCMP_SYS(sysinfo),
-    SCMP_SYS(sched_getaffinity),
-    SCMP_SYS(sched_yield),
-    SCMP_SYS(setitimer),
-    SCMP_SYS(exit),
-    SCMP_SYS(exit_group),
-    SCMP_SYS(restart_syscall),
+    SCMP_SYS(mremap),        SCMP_SYS(brk),
+    SCMP_SYS(rt_sigaction),  SCMP_SYS(rt_sigprocmask),
+    SCMP_SYS(rt_sigreturn),  SCMP_SYS(sigreturn),
+    SCMP_SYS(getpid),        SCMP_SYS(gettid),
+    SCMP_SYS(clock_gettime), SCMP_SYS(clock_gettime64),
+    SCMP_SYS(gettimeofday),  SCMP_SYS(getrandom),
+    SCMP_SYS(sysinfo),       SCMP_SYS(sched_getaffinity),
+    SCMP_SYS(sched_yield),   SCMP_SYS(exit),
+    SCMP_SYS(exit_group),    SCMP_SYS(restart_syscall),
+};
+
+/// A call that is allowed where an argument, as far as the mask looks at it, has this value.
+struct ArgumentRule {
+  int call;
+  unsigned argument;
+  scmp_datum_t mask;
+  scmp_datum_t value;
+};
+
+constexpr scmp_datum_t kWhole = 0xFFFFFFFF;
+/// Of what a futex can do, the waiting and waking of ordinary locks.
+constexpr auto kFutexCommand = static_cast<scmp_datum_t>(static_cast<uint32_t>(FUTEX_CMD_MASK));
+
+constexpr ArgumentRule kAllowedWhere[] = {
+    {SCMP_SYS(mmap), 2, PROT_EXEC, 0},
+    {SCMP_SYS(mmap2), 2, PROT_EXEC, 0},
+    {SCMP_SYS(mprotect), 2, PROT_EXEC, 0},
+    {SCMP_SYS(madvise), 2, kWhole, MADV_DONTNEED},
+    {SCMP_SYS(madvise), 2, kWhole, MADV_FREE},
+    // How this C library asks for the status of an open file.
+    {SCMP_SYS(newfstatat), 3, AT_EMPTY_PATH, AT_EMPTY_PATH},
+    // What it asks of an open file before it reads it as a stream. Not whom to signal when it changes.
+    {SCMP_SYS(fcntl), 1, kWhole, F_GETFL},
+    {SCMP_SYS(fcntl64), 1, kWhole, F_GETFL},
+    {SCMP_SYS(fcntl), 1, kWhole, F_GETFD},
+    {SCMP_SYS(fcntl64), 1, kWhole, F_GETFD},
+    {SCMP_SYS(fcntl), 1, kWhole, F_SETFD},
+    {SCMP_SYS(fcntl64), 1, kWhole, F_SETFD},
+    {SCMP_SYS(fcntl), 1, kWhole, F_DUPFD},
+    {SCMP_SYS(fcntl64), 1, kWhole, F_DUPFD},
+    {SCMP_SYS(fcntl), 1, kWhole, F_DUPFD_CLOEXEC},
+    {SCMP_SYS(fcntl64), 1, kWhole, F_DUPFD_CLOEXEC},
+    {SCMP_SYS(futex), 1, kFutexCommand, FUTEX_WAIT},
+    {SCMP_SYS(futex_time64), 1, kFutexCommand, FUTEX_WAIT},
+    {SCMP_SYS(futex), 1, kFutexCommand, FUTEX_WAKE},
+    {SCMP_SYS(futex_time64), 1, kFutexCommand, FUTEX_WAKE},
+    {SCMP_SYS(futex), 1, kFutexCommand, FUTEX_WAIT_BITSET},
+    {SCMP_SYS(futex_time64), 1, kFutexCommand, FUTEX_WAIT_BITSET},
+    {SCMP_SYS(recvmsg), 0, kWhole, kWorkerSocket},
+    {SCMP_SYS(setitimer), 0, kWhole, ITIMER_PROF},
 };
 
 bool Allow(scmp_filter_ctx filter, int call) { return seccomp_rule_add(filter, SCMP_ACT_ALLOW, call, 0) == 0; }
 
-bool AllowWhere(scmp_filter_ctx filter, int call, const scmp_arg_cmp& argument) {
-  return seccomp_rule_add_array(filter, SCMP_ACT_ALLOW, call, 1, &argument) == 0;
+bool AllowWhere(scmp_filter_ctx filter, const ArgumentRule& rule) {
+  const scmp_arg_cmp argument = {rule.argument, SCMP_CMP_MASKED_EQ, rule.mask, rule.value};
+  return seccomp_rule_add_array(filter, SCMP_ACT_ALLOW, rule.call, 1, &argument) == 0;
 }
 
 bool AddRules(scmp_filter_ctx filter) {
   bool added = true;
   for (const int call : kAllowed) added = Allow(filter, call) && added;
+  for (const ArgumentRule& rule : kAllowedWhere) added = AllowWhere(filter, rule) && added;
   // How a sanitizer asks whether memory is there, and where the stacks are when an exception passes.
-  for (const int call : {SCMP_SYS(pipe2), SCMP_SYS(sigaltstack)}) added = (!kSanitized || Allow(filter, call)) && added;
-  const scmp_arg_cmp not_executable = SCMP_A2(SCMP_CMP_MASKED_EQ, PROT_EXEC, 0);
-  for (const int call : {SCMP_SYS(mmap), SCMP_SYS(mmap2), SCMP_SYS(mprotect)}) {
-    added = AllowWhere(filter, call, not_executable) && added;
+  for (const int call : {SCMP_SYS(pipe2), SCMP_SYS(sigaltstack), SCMP_SYS(madvise)}) {
+    added = (!kSanitized || Allow(filter, call)) && added;
   }
-  // How this C library asks for the status of an open file.
-  added = AllowWhere(filter, SCMP_SYS(newfstatat), SCMP_A3(SCMP_CMP_MASKED_EQ, AT_EMPTY_PATH, AT_EMPTY_PATH)) && added;
   // How a process ends itself.
-  const scmp_arg_cmp itself = {0, SCMP_CMP_EQ, static_cast<scmp_datum_t>(getpid()), 0};
-  return AllowWhere(filter, SCMP_SYS(tgkill), itself) && added;
+  return AllowWhere(filter, {SCMP_SYS(tgkill), 0, kWhole, static_cast<scmp_datum_t>(getpid())}) && added;
 }
 
 bool CloseSystemCalls() {
@@ -142,16 +166,31 @@ bool CloseSystemCalls() {
 
 }  // namespace
 
-std::vector<std::string> CloseSandbox(const char* empty_folder) {
+std::vector<std::string> GiveUpRights(const char* empty_folder) {
+  std::vector<std::string> missing;
+  const auto note = [&missing](bool given_up, const char* name) {
+    if (!given_up) missing.emplace_back(name);
+  };
+  if (geteuid() == 0) {  // everybody else can neither change users nor the root
+    note(empty_folder == nullptr || chroot(empty_folder) == 0, "an empty root");
+    const bool alone = chdir("/") == 0 && setgroups(0, nullptr) == 0;
+    const bool own = BecomeUser(OwnUser());
+    note(own, "a user of its own");
+    note(alone && (own || BecomeUser(kNobody)), "a user without rights");
+  }
+  note(DropCapabilities(), "no capabilities");
+  (void)prctl(PR_SET_DUMPABLE, 0);
+  note(prctl(PR_SET_NO_NEW_PRIVS, 1, 0, 0, 0) == 0, "no new privileges");
+  return missing;
+}
+
+std::vector<std::string> CloseSandbox() {
   std::vector<std::string> missing;
   const auto note = [&missing](bool closed, const char* name) {
     if (!closed) missing.emplace_back(name);
   };
   note(YieldToOthers(), "idle priority");
-  note(BecomeNobody(empty_folder), "a user without rights");
-  (void)prctl(PR_SET_DUMPABLE, 0);
   note(LimitResources(), "resource limits");
-  note(prctl(PR_SET_NO_NEW_PRIVS, 1, 0, 0, 0) == 0, "no new privileges");
   note(CloseFileSystem(), "Landlock");
   note(CloseSystemCalls(), "seccomp");
   return missing;

@@ -14,11 +14,16 @@ inline constexpr bool kSanitized = __has_feature(address_sanitizer) || __has_fea
 inline constexpr bool kSanitized = false;
 #endif
 
-/// Takes from this process, for good, all but computing and reading what is open: files by name, sockets, processes,
-/// executable memory, other users' rights. What the kernel does not have is left out.
+/// Takes from this process, for good, what root may and others may not: a template needs nothing of it once it is
+/// loaded, and its workers never have it. Whoever may change users becomes one that nobody else is.
 /// @param empty_folder becomes the root of the file system where that is allowed
+/// @return what is missing, one name each; empty when all is given up
+std::vector<std::string> GiveUpRights(const char* empty_folder);
+
+/// Takes from this process, for good, all but computing and reading what is open: files by name, sockets, processes,
+/// executable memory. What the kernel does not have is left out.
 /// @return what is missing, one name each; empty when the sandbox is complete
-std::vector<std::string> CloseSandbox(const char* empty_folder);
+std::vector<std::string> CloseSandbox();
 
 /// The CPU time that one file may take.
 inline constexpr int kCpuSecondsPerFile = 20;

@@ -17,6 +17,8 @@
 #include <sstream>
 #include <string>
 #include <string_view>
+#include <utility>
+#include <vector>
 
 #include <json/writer.h>
 
@@ -147,14 +149,15 @@ void KeepMemory() {
 }
 
 /// Reads files for the daemon until that hangs up.
-int ReadFiles(const Worker& worker, const char* empty_folder, int region_fd) {
+int ReadFiles(const Worker& worker, std::vector<std::string> missing, int region_fd) {
   void* const mapped = mmap(nullptr, kRegionBytes, PROT_READ | PROT_WRITE, MAP_SHARED, region_fd, 0);
   if (mapped == MAP_FAILED) return kExitNoMemory;
   (void)close(region_fd);
   char* const region = static_cast<char*>(mapped);
   Json::Value greeting(Json::objectValue);
   greeting["missing"] = Json::Value(Json::arrayValue);
-  for (const std::string& piece : CloseSandbox(empty_folder)) greeting["missing"].append(piece);
+  for (std::string& piece : CloseSandbox()) missing.push_back(std::move(piece));
+  for (const std::string& piece : missing) greeting["missing"].append(piece);
   bool connected = Answer(0, greeting);
   for (Request request; connected && ReceiveRequest(request);) {
     Findings findings;
@@ -186,12 +189,13 @@ int RunWorker(const Worker& worker, const char* empty_folder) try {
   KeepMemory();
   (void)setenv("TZ", "UTC0", 1);  // else each time in an archive makes the C library look for the zone's file
   worker.prepare();
+  const std::vector<std::string> missing = GiveUpRights(empty_folder);
   for (int socket, region; ReceiveFork(socket, region);) {
     const pid_t pid = Fork();
     const ForkAnswer answer = {pid < 0 ? -errno : pid};
     if (answer.pid == 0) {
       if (dup2(socket, kWorkerSocket) < 0 || close(socket) != 0) return EXIT_FAILURE;
-      return ReadFiles(worker, empty_folder, region);
+      return ReadFiles(worker, missing, region);
     }
     (void)close(socket);
     (void)close(region);

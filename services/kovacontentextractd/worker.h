@@ -17,9 +17,10 @@ struct Worker {
   void (*prepare)();
 };
 
-/// Loads what the readers need and then makes workers, as the daemon asks for them, by forks. Each of these closes its
-/// sandbox, says what of it could not be had, and reads files; all until the daemon hangs up. `empty_folder` becomes
-/// the root of a worker's file system where that is allowed. @return the exit status, of each of the processes.
+/// Loads what the readers need, gives up all rights, and then makes workers, as the daemon asks for them, by forks.
+/// Each of these closes its sandbox, says what of it could not be had, and reads files; all until the daemon hangs up.
+/// `empty_folder` becomes the root of their file system where that is allowed. @return the exit status, of each
+/// process.
 int RunWorker(const Worker& worker, const char* empty_folder);
 
 }  // namespace ferrox::extract

@@ -2,9 +2,12 @@
 
 #include <fcntl.h>
 #include <linux/fs.h>
+#include <linux/futex.h>
 #include <sched.h>
 #include <signal.h>
+#include <sys/ioctl.h>
 #include <sys/mman.h>
+#include <sys/prctl.h>
 #include <sys/ptrace.h>
 #include <sys/resource.h>
 #include <sys/socket.h>
@@ -138,6 +141,9 @@ void TryToEscape(const Source& source, Findings& findings) {
   const int memory = PROT_READ | PROT_WRITE;
   void* const page = mmap(nullptr, 4096, memory, MAP_PRIVATE | MAP_ANONYMOUS, -1, 0);
   const rlimit more = {RLIM_INFINITY, RLIM_INFINITY};
+  struct flock lock = {};
+  lock.l_type = F_RDLCK;
+  uint32_t word = 0;
   struct stat info;
   report("open", open("/etc/passwd", O_RDONLY) >= 0);
   report("open a folder", open("/", O_RDONLY | O_DIRECTORY) >= 0);
@@ -157,6 +163,13 @@ void TryToEscape(const Source& source, Findings& findings) {
   report("memory made executable", mprotect(page, 4096, PROT_READ | PROT_EXEC) == 0);
   report("kill", kill(getppid(), 0) == 0);
   report("trace", ptrace(PTRACE_TRACEME, 0, nullptr, nullptr) == 0);
+  report("be signalled", fcntl(source.fd, F_SETOWN, getpid()) == 0 || fcntl(source.fd, F_SETSIG, SIGKILL) == 0 ||
+                             fcntl(source.fd, F_SETFL, O_ASYNC) == 0 || fcntl(source.fd, F_SETLEASE, F_RDLCK) == 0);
+  report("lock the file", fcntl(source.fd, F_OFD_SETLK, &lock) == 0);
+  report("lend priority", syscall(SYS_futex, &word, FUTEX_LOCK_PI, 0, nullptr, nullptr, 0) == 0);
+  report("merge memory", madvise(page, 4096, MADV_MERGEABLE) == 0);
+  report("signals of a socket", ioctl(kWorkerSocket, FIOASYNC, &lock) == 0);
+  report("process options", prctl(PR_SET_DUMPABLE, 1) == 0);
   report("limits", setrlimit(RLIMIT_AS, &more) == 0);
   report("identity", setuid(0) == 0);
   report("io_uring", syscall(SYS_io_uring_setup, 1, nullptr) >= 0);

@@ -9,10 +9,9 @@ import unittest
 import zipfile
 from email.message import EmailMessage
 
-from instance import BIN, InstanceTestCase, children, process_facts, wait_for, write
+from instance import BIN, InstanceTestCase, children, process_facts, wait_for, workers_of, write
 
 DAEMON = "kovacontentextractd"
-NOBODY = 65534
 
 
 def office_document(word):
@@ -193,19 +192,21 @@ class ExtractionTest(InstanceTestCase):
         status = self.instance.status()["content_extraction"]
         self.assertEqual((1, 0), (status["files"], status["blamed"]))
         self.assertRegex(self.ctl("status"), b"content extraction: runs, process [0-9]+, 1 of at most [0-9]+ workers, 1 files")
-        workers = 0
-        for pid in children(self.instance.pid(DAEMON)):
+        daemon = self.instance.pid(DAEMON)
+        workers = workers_of(daemon)
+        self.assertEqual(status["workers"], len(workers))
+        for pid in children(daemon):  # also what workers are forked from
             facts = process_facts(pid)
-            if facts["NoNewPrivs"] == "0":
-                continue  # what workers are forked from
-            workers += 1
-            self.assertEqual("0000000000000000", facts["CapEff"])
-            if "seccomp" not in status["missing"]:
+            self.assertEqual("1", facts["NoNewPrivs"])
+            self.assertEqual({"0" * 16}, {facts[kind] for kind in ("CapInh", "CapPrm", "CapEff", "CapAmb")})
+            if pid in workers and "seccomp" not in status["missing"]:
                 self.assertEqual("2", facts["Seccomp"])
             if os.geteuid() == 0:
-                self.assertEqual([str(NOBODY)] * 4, facts["Uid"].split())
                 self.assertNotEqual(os.stat("/"), os.stat(f"/proc/{pid}/root/"))
-        self.assertEqual(status["workers"], workers)
+                self.assertEqual("", facts["Groups"].strip())
+                if "a user of its own" not in status["missing"]:
+                    self.assertEqual(1, len(set(facts["Uid"].split() + facts["Gid"].split())))
+                    self.assertGreater(int(facts["Uid"].split()[0]), 1 << 31)
 
 
 if __name__ == "__main__":

@@ -19,7 +19,7 @@ import threading
 import time
 import unittest
 
-from instance import InstanceTestCase, children, process_facts, wait_for
+from instance import InstanceTestCase, children, process_facts, wait_for, workers_of
 
 sys.path.insert(0, os.path.join(os.path.dirname(os.path.abspath(__file__)), "..", "corpus"))
 import hostile  # noqa: E402
@@ -68,17 +68,6 @@ class Extractor:
     def extract(self, path, root):
         found, text = self.ask("extract", {"path": os.fsdecode(path), "root": os.fsdecode(root)})
         return found, text
-
-
-def workers_of(daemon):
-    """Its children that are in the sandbox; the others are what workers are forked from."""
-    found = []
-    for child in children(daemon):
-        try:
-            found += [child] if process_facts(child)["NoNewPrivs"] == "1" else []
-        except (OSError, KeyError):
-            continue  # it has ended
-    return found
 
 
 class Watch:

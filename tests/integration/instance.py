@@ -184,6 +184,18 @@ def process_facts(pid):
         return dict(line.split(":\t", 1) for line in file.read().splitlines() if ":\t" in line)
 
 
+def workers_of(daemon):
+    """Its children that have closed their sandbox, which makes them nicer; the others are what they are forked from."""
+    found = []
+    for child in children(daemon):
+        try:
+            nicer = os.getpriority(os.PRIO_PROCESS, child) > os.getpriority(os.PRIO_PROCESS, daemon)
+        except ProcessLookupError:
+            continue
+        found += [child] if nicer else []
+    return found
+
+
 def write(path, text):
     os.makedirs(os.path.dirname(path), exist_ok=True)
     with open(path, "wb") as file:
