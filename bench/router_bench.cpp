@@ -7,6 +7,8 @@
 //   Replace    a file is created beside, written, closed and renamed over its old version: two lines
 //   RemoveTree files of 100 folders are deleted, each folder after its 1,000 files
 //   Moves      folders are made, filled, renamed and removed
+//   Nested/N   N folders, each in the one before, are deleted from the deepest up: bytes_per_second counts their paths,
+//              and is about the same for each N
 //
 // OneFolder watches one folder for one queue, ManyFolders 1,000 for each of 10. Held has a queue that cannot be
 // appended to, so that changes become comparisons.
@@ -107,6 +109,26 @@ BENCHMARK_CAPTURE(OneFolder, Unpack, Unpack);
 BENCHMARK_CAPTURE(OneFolder, Replace, Replace);
 BENCHMARK_CAPTURE(OneFolder, RemoveTree, RemoveTree);
 BENCHMARK_CAPTURE(OneFolder, Moves, Moves);
+
+void Nested(benchmark::State& state) {
+  const QueueFolder folder;
+  QueueRouter router{QueueRouter::Options()};
+  router.SetQueues({{folder.Queue("queue"), {{"/volume1/photo", 0xFFC6, {"@eaDir"}}}}});
+  std::vector<Change> changes;
+  std::string path = "/volume1/photo";
+  for (int64_t i = 0; i < state.range(0); ++i) changes.push_back({Kind::kDeleted, true, path += "/d"});
+  int64_t bytes = 0;
+  const auto now = QueueRouter::TimePoint::clock::now();
+  for (auto _ : state) {
+    for (auto change = changes.rbegin(); change != changes.rend(); ++change) {
+      bytes += static_cast<int64_t>(change->path.size());
+      router.Put(*change, now);
+    }
+    (void)router.Flush(now);
+  }
+  state.SetBytesProcessed(bytes);
+}
+BENCHMARK(Nested)->Arg(500)->Arg(2000)->Arg(8000);
 
 void ManyFolders(benchmark::State& state) {
   const QueueFolder folder;

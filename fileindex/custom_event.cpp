@@ -84,8 +84,7 @@ class QueuedReindexes {
 
   /// QueueMgr::IsFullPathHasReindex: what stands before a bad line is found, then the bad line fails.
   bool Cover(const std::string& full_path) const {
-    bool is_covered = false;
-    paths_.VisitUpwards(full_path, [&is_covered](bool) { return is_covered = true; });
+    const bool is_covered = paths_.HasAtOrAbove(full_path);
     if (!is_covered && failure_) throw Error(*failure_);
     return is_covered;
   }

@@ -1,6 +1,7 @@
 #include "services/fileindexd/operation_runner.h"
 
 #include <fcntl.h>
+#include <limits.h>
 #include <syslog.h>
 
 #include <cerrno>
@@ -26,6 +27,9 @@ constexpr auto kTimeBeforeCount = std::chrono::milliseconds(300);
 constexpr unsigned kRemovedAtOnce = 1000;
 /// So few changes are what somebody is waiting for, rather than a folder that is copied.
 constexpr uint64_t kUrgentOperations = 4;
+
+/// Whether nothing can be indexed there: a walk leaves out what has such a path.
+bool IsTooLong(const std::string& path) { return path.size() >= PATH_MAX; }
 
 }  // namespace
 
@@ -91,6 +95,11 @@ void OperationRunner::CarryOut(const fileindex::OP& op, Stage stage) {
     if (stage == Stage::kMove) {
       Log(LOG_WARNING, "queue of share %s: %s lies outside of it", context_.share.c_str(), path.c_str());
     }
+    return;
+  }
+  if (IsTooLong(path)) {
+    // What was moved there has left the index; all else there was never in it.
+    if (stage == Stage::kLook && op.op == fileindex::OP_RENAME) CompareOnce(op.path);
     return;
   }
   for (const Handler& handler : kHandlers) {
@@ -234,11 +243,9 @@ bool OperationRunner::BecameReadable(const std::string& folder) {
 /// A folder that is copied leaves a reindex for each of its subfolders. All changes of this queue are older than its
 /// first comparison, so what was compared once need not be again.
 void OperationRunner::CompareOnce(const std::string& path) {
-  for (std::string folder = path; folder.size() >= context_.root.size(); folder = Dirname(folder)) {
-    if (compared_.count(folder) != 0) return;
-  }
+  if (IsTooLong(path) || compared_.HasAtOrAbove(path)) return;
   Compare(path);
-  compared_.insert(path);
+  compared_.Insert(path, true);
 }
 
 void OperationRunner::Compare(const std::string& path) {

@@ -9,6 +9,7 @@
 #include <vector>
 
 #include "fileindex/optree.h"
+#include "fileindex/path_table.h"
 #include "services/fileindexd/change_follower.h"
 #include "services/fileindexd/comparison.h"
 #include "services/fileindexd/document_mover.h"
@@ -114,7 +115,7 @@ class OperationRunner {
   RemovalBatch gone_trees_;
   RemovalBatch gone_;
   const std::set<std::string> ahead_before_;  ///< written ahead of this pass
-  std::set<std::string> compared_;
+  fileindex::PathTable<bool> compared_;
   bool had_reindex_ = false;
   std::chrono::steady_clock::time_point last_commit_ = std::chrono::steady_clock::now();
   ChangeFollower follower_;

@@ -1,9 +1,8 @@
 #pragma once
 
-#include <set>
 #include <string>
 
-#include "common/file_util.h"
+#include "fileindex/path_table.h"
 
 namespace ferrox::indexd {
 
@@ -11,19 +10,13 @@ namespace ferrox::indexd {
 class PathsUnderWay {
  public:
   /// Whether something at, above or below the path is worked on.
-  bool Touch(const std::string& path) const {
-    for (std::string above = path; above.size() > 1; above = Dirname(above)) {
-      if (paths_.count(above) != 0) return true;
-    }
-    const auto next = paths_.lower_bound(path + "/");
-    return next != paths_.end() && StringStartWith(*next, path + "/");
-  }
-  void Add(const std::string& path) { paths_.insert(path); }
-  void Clear() { paths_.clear(); }
-  size_t Count() const { return paths_.size(); }
+  bool Touch(const std::string& path) const { return paths_.HasBelow(path) || paths_.HasAtOrAbove(path); }
+  void Add(const std::string& path) { paths_.Insert(path, true); }
+  void Clear() { paths_ = {}; }
+  size_t Count() const { return paths_.Size(); }
 
  private:
-  std::set<std::string> paths_;
+  fileindex::PathTable<bool> paths_;
 };
 
 }  // namespace ferrox::indexd

@@ -185,9 +185,14 @@ TEST_F(ShareWorkerTest, WhatIsNotIndexedIsTakenOut) {
 }
 
 TEST_F(ShareWorkerTest, VanishedFilesAndForeignPathsStopNothing) {
-  test::WriteFile(At("there"), "1");
+  test::WriteFile(At("moved"), "1");
+  Process(Line(kCreate, At("moved")));
+  fs::rename(At("moved"), At("there"));
+  std::string deep = root;  // nobody can open such a path, but folders nested so deep can be made
+  for (int depth = 0; depth < 100000; ++depth) deep += "/d";
   Process(Line(kCreate, At("gone")) + Line(kModify, "/etc/passwd") + Line(kAttr, At("gone2")) +
-          Line(kRename, At("gone4"), At("gone3")) + "not json\n" + Line(kCreate, At("there")));
+          Line(kRename, At("gone4"), At("gone3")) + "not json\n" + Line(kCreate, deep) + Line(kReindex, deep) +
+          Line(kRename, deep, At("moved")) + Line(kRename, At("gone5"), deep) + Line(kCreate, At("there")));
   EXPECT_EQ(Expected(), Indexed());
 }
 

@@ -26,10 +26,6 @@ Place PlaceOf(const std::string& path, bool is_folder, size_t root_size) {
   return {size == 0 ? "/" : path.substr(0, size), root_size};
 }
 
-void FormatRoot(std::string& text, const std::string& path, size_t root_size) {
-  AppendQueueLine(text, EVENT_REINDEX, true, root_size == 0 ? "/" : std::string_view(path).substr(0, root_size), "");
-}
-
 }  // namespace
 
 /// Whether the line asks for a look at all below its path.
@@ -111,7 +107,7 @@ void QueueOutbox::Close(std::string_view path) {
   const Line* line = OpenLine(path);
   if (line == nullptr) return;
   if (IsWhole(*line)) --whole_;
-  open_.Erase(std::string(path));
+  open_.Erase(path);
 }
 
 void QueueOutbox::CloseAll() {
@@ -171,13 +167,7 @@ size_t QueueOutbox::Format(size_t first, size_t max_bytes, std::string& text) co
   const size_t end = text.size() + max_bytes;
   for (; at < lines_.size() && text.size() < end; ++at) {
     const Line& line = lines_[at];
-    const size_t begin = text.size();
     AppendQueueLine(text, line.event, line.is_folder, line.path, line.path_old);
-    if (text.size() - begin - 1 <= fileindex::kQueueLineMaxBytes) continue;
-    // Longer than any line may be: the watched folder is compared instead.
-    text.resize(begin);
-    FormatRoot(text, line.path, line.root_size);
-    if (line.event == EVENT_RENAME) FormatRoot(text, line.path_old, line.root_size_old);
   }
   return at - first;
 }

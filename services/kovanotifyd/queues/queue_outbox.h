@@ -10,7 +10,8 @@
 
 namespace ferrox::notifyd {
 
-/// A name below a watched folder, which is the path cut to `root_size`.
+/// A name below a watched folder, which is the path cut to `root_size`. Shorter than PATH_MAX: however its bytes are
+/// escaped, a line of two such paths is shorter than a queue's lines may be.
 struct WatchedName {
   std::string_view path;
   bool is_folder = false;

@@ -1,5 +1,7 @@
 #include "services/kovanotifyd/queues/queue_router.h"
 
+#include <limits.h>
+
 #include <algorithm>
 #include <string_view>
 #include <utility>
@@ -23,6 +25,12 @@ namespace {
 /// Files that may be open with unreported writes at the same time.
 constexpr size_t kOpenFilesMax = 10000;
 
+/// Such a path cannot be opened and is not indexed, but folders may be nested as deep as anybody likes.
+bool IsTooLong(const std::string& path) { return path.size() >= PATH_MAX; }
+
+/// The deepest folder above the path that can be opened with what is in it.
+std::string DeepestFolder(const std::string& path) { return path.substr(0, path.rfind('/', PATH_MAX - 1)); }
+
 }  // namespace
 
 class QueueRouter::Impl {
@@ -42,6 +50,7 @@ class QueueRouter::Impl {
 
   void Tell(uint32_t event, const std::string& path, bool is_folder);
   void Tell(const Match& match, uint32_t event, const std::string& path, bool is_folder);
+  void PutTooLong(const Change& change);
   void Rename(const Change& change);
   void RenameWithin(const Change& change, const Match& from, const Match& to);
   void Compare(size_t queue, const std::string& path, size_t root_size);
@@ -67,6 +76,7 @@ void QueueRouter::Impl::SetQueues(const std::map<std::string, std::vector<QueueW
 }
 
 void QueueRouter::Impl::Put(const Change& change, TimePoint now) {
+  if (IsTooLong(change.path) || IsTooLong(change.old_path)) return PutTooLong(change);
   switch (change.kind) {
     case Change::Kind::kCreated:
       return Tell(EVENT_CREATE, change.path, change.is_folder);
@@ -87,6 +97,21 @@ void QueueRouter::Impl::Put(const Change& change, TimePoint now) {
     case Change::Kind::kUncertain:
       return PutComparison(change.path);
   }
+}
+
+/// Of what cannot be indexed, the reader needs to know that it is there, or has gone, and not what is in it.
+void QueueRouter::Impl::PutTooLong(const Change& change) {
+  if (change.kind == Change::Kind::kModified || change.kind == Change::Kind::kWritten ||
+      change.kind == Change::Kind::kAttributes) {
+    return;
+  }
+  if (change.kind == Change::Kind::kRenamed) {
+    open_files_.Forget(change.old_path, change.is_folder);
+    IsTooLong(change.old_path) ? PutComparison(DeepestFolder(change.old_path))
+                               : Tell(EVENT_DELETE, change.old_path, change.is_folder);
+    if (!IsTooLong(change.path)) return Tell(EVENT_CREATE, change.path, change.is_folder);
+  }
+  PutComparison(DeepestFolder(change.path));
 }
 
 /// Whether no queue needs to hear of a write to the file: none wants to, or a line that waits will say as much.

@@ -12,8 +12,8 @@
 
 namespace ferrox::notifyd {
 
-/// Which queues want to hear of a path, and of which kinds of changes. A lookup costs a hash for each component of the
-/// path, however many folders are watched.
+/// Which queues want to hear of a path, and of which kinds of changes. A lookup costs a hash for each component that
+/// the path shares with a watched folder, however many folders are watched.
 class WatchRules {
  public:
   /// A queue, by its place among the queues' names in order, that watches a path.
