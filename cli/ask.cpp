@@ -5,6 +5,7 @@
 
 #include "cli/command.h"
 #include "common/error.h"
+#include "common/file_util.h"
 #include "common/json_util.h"
 #include "common/paths.h"
 #include "services/support/local_request.h"
@@ -32,6 +33,7 @@ constexpr Daemon kContentExtraction = {"content extraction", kContentExtractdSoc
 
 constexpr char kNoAnswer[] = "does not answer; see its log, or restart it ('fileindexctl down', 'up')";
 
+/// @throws Refusal.
 Json::Value DataOf(const Daemon& daemon, const std::string& text) {
   Json::Value reply;
   bool success = false;
@@ -41,9 +43,11 @@ Json::Value DataOf(const Daemon& daemon, const std::string& text) {
   }
   GetJsonValue(success, reply, "success", false);
   if (success) return reply["data"];
+  int code = 0;
   std::string message = "the request failed";
+  GetJsonValue(code, reply["error"], "code", false);
   GetJsonValue(message, reply["error"], "msg", false);
-  throw Failure(std::string(daemon.name) + ": " + message);
+  throw Refusal(daemon.name, code, message);
 }
 
 RequestResult Ask(const Daemon& daemon, const Json::Value& request, const std::string& end, std::string& reply,
@@ -114,6 +118,16 @@ Json::Value Sync(const Daemon& daemon, Json::Value data, std::chrono::millisecon
   return Answer(daemon, result, reply);
 }
 
+/// Why the index daemon cannot say that the shares (none named: all) are up to date; "" when it does.
+std::string WhyBehind(const std::vector<std::string>& shares, std::chrono::milliseconds longest) try {
+  Json::Value data(Json::objectValue);
+  for (const std::string& share : shares) data["shares"].append(share);
+  (void)Sync(kIndexDaemon, data, longest);
+  return "";
+} catch (const Refusal& refusal) {
+  return refusal.Reason();
+}
+
 }  // namespace
 
 Json::Value AskEngine(const std::string& command, const Json::Value& data) {
@@ -147,19 +161,30 @@ InstanceState AskAll() {
   return state;
 }
 
-/// First what the file systems have reported is in the queues, then what is in the queues is in the index.
-void AwaitChanges(const std::string& share, std::chrono::seconds longest) {
+/// First what the file systems have reported is in the queues, then what is in the queues is in the index. Only where
+/// that cannot be said of all shares together, each is asked for by itself.
+std::map<std::string, std::string> AwaitChanges(const std::vector<std::string>& shares, std::chrono::seconds longest) {
   using std::chrono::milliseconds;
   const auto end = std::chrono::steady_clock::now() + longest;
+  const auto left = [end] {
+    return std::max(std::chrono::duration_cast<milliseconds>(end - std::chrono::steady_clock::now()), milliseconds(0));
+  };
   const Json::Value noticed = Sync(kNotificationDaemon, Json::Value(Json::objectValue), longest);
   std::string problems;
   for (const Json::Value& problem : noticed["problems"])
     problems += (problems.empty() ? "" : "; ") + problem.asString();
   if (!problems.empty()) throw Failure(problems);
-  Json::Value data(Json::objectValue);
-  if (!share.empty()) data["shares"].append(share);
-  const auto left = std::chrono::duration_cast<milliseconds>(end - std::chrono::steady_clock::now());
-  (void)Sync(kIndexDaemon, data, std::max(left, milliseconds(0)));
+  const std::string refusal = WhyBehind(shares, left());
+  if (refusal.empty()) return {};
+  if (shares.empty()) throw Failure(std::string(kIndexDaemon.name) + ": " + refusal);
+  std::map<std::string, std::string> behind;
+  for (const std::string& share : shares) {
+    std::string reason = shares.size() == 1 ? refusal : WhyBehind({share}, left());
+    const std::string name = "share " + share + ": ";
+    if (StringStartWith(reason, name)) reason.erase(0, name.size());
+    if (!reason.empty()) behind[share] = reason;
+  }
+  return behind;
 }
 
 void RequireEngine() { (void)AskEngine("ping", Json::Value(Json::objectValue), kStateWait); }

@@ -1,7 +1,9 @@
 #pragma once
 
 #include <chrono>
+#include <map>
 #include <string>
+#include <vector>
 
 #include <json/value.h>
 
@@ -30,9 +32,10 @@ struct InstanceState {
 /// Asks all daemons at once and waits for each at most 5 s, so that one that hangs hides nothing of the others.
 InstanceState AskAll();
 
-/// Waits until what was changed before, in a share or ("") in all, is in the index.
-/// @throws Failure, with reason and remedy, when that is not so within the time.
-void AwaitChanges(const std::string& share, std::chrono::seconds longest);
+/// Waits until what was changed before in the shares (none named: in all that are worked on) is in the index. @return
+/// the shares of which that cannot be said, each with reason and remedy.
+/// @throws Failure, with reason and remedy, when it can be said of none of them.
+std::map<std::string, std::string> AwaitChanges(const std::vector<std::string>& shares, std::chrono::seconds longest);
 
 /// For operations that need a daemon at their end: better nothing is begun without it.
 /// @throws Failure when it does not run or does not answer.

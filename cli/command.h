@@ -7,7 +7,8 @@
 
 namespace ferrox::cli {
 
-enum ExitCode { kDone = 0, kNothingFound = 1, kWrongUsage = 2, kFailure = 3, kNotFresh = 4 };
+/// kIncomplete: something that was asked for was left out, or may not be up to date.
+enum ExitCode { kDone = 0, kNothingFound = 1, kWrongUsage = 2, kFailure = 3, kIncomplete = 4 };
 
 /// The command line cannot be understood: exit code 2.
 class UsageError : public std::runtime_error {
@@ -19,6 +20,19 @@ class UsageError : public std::runtime_error {
 class Failure : public std::runtime_error {
  public:
   using std::runtime_error::runtime_error;
+};
+
+/// The same, where a daemon refused: its error code, and its sentence alone.
+class Refusal : public Failure {
+ public:
+  Refusal(const std::string& daemon, int code, const std::string& reason)
+      : Failure(daemon + ": " + reason), code_(code), reason_(reason) {}
+  int Code() const { return code_; }
+  const std::string& Reason() const { return reason_; }
+
+ private:
+  int code_;
+  std::string reason_;
 };
 
 /// An option of a command, such as "--limit N".

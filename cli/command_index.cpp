@@ -10,6 +10,7 @@
 #include "cli/configuration_change.h"
 #include "cli/escape.h"
 #include "cli/format.h"
+#include "cli/left_out.h"
 #include "cli/progress.h"
 #include "common/error.h"
 #include "fileindex/folder_mgr.h"
@@ -126,13 +127,16 @@ int RunIndex(const Arguments& arguments) {
 
 int RunSuggestRefresh(const Arguments& arguments) {
   const std::vector<std::string> shares = IndexedShares(arguments.words);
-  std::vector<std::string> databases;
-  databases.reserve(shares.size());
-  for (const std::string& share : shares) databases.push_back(sdk::SDKShare(share).GetDBName());
   RequireEngine();
-  fileindex::UpdateTermSuggestion(databases);
-  (void)printf("suggestions of %s shares are new\n", Count(shares.size()).c_str());
-  return kDone;
+  size_t done = 0;
+  LeftOut left_out;
+  for (const std::string& share : shares) {
+    const std::string database = sdk::SDKShare(share).GetDBName();
+    if (left_out.Unless(share, [&] { fileindex::UpdateTermSuggestion({database}); })) ++done;
+  }
+  (void)printf("suggestions of %s shares are new\n", Count(done).c_str());
+  left_out.Tell();
+  return left_out.Empty() ? kDone : kIncomplete;
 }
 
 }  // namespace ferrox::cli

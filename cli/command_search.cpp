@@ -1,13 +1,18 @@
 #include <unistd.h>
 
+#include <algorithm>
 #include <chrono>
 #include <cstdio>
+#include <set>
 
 #include "cli/ask.h"
 #include "cli/command_table.h"
 #include "cli/escape.h"
+#include "cli/explain.h"
 #include "cli/format.h"
+#include "cli/left_out.h"
 #include "fileindex/elastic/elastic_control.h"
+#include "fileindex/folder_mgr.h"
 #include "fileindex/util.h"
 #include "sdk/share.h"
 
@@ -22,6 +27,7 @@ constexpr long long kFreshSecondsMax = 600;
 /// What the engine puts around a match. Not shown: each becomes what the output can show.
 constexpr char kMarkStart = '\x02';
 constexpr char kMarkEnd = '\x03';
+constexpr char kWithoutFresh[] = "Without --fresh, or with --partial, the search shows what is indexed by now.";
 
 std::string JoinWords(const std::vector<std::string>& words) {
   std::string query;
@@ -29,12 +35,37 @@ std::string JoinWords(const std::vector<std::string>& words) {
   return query;
 }
 
-Json::Value SearchRequest(const Arguments& arguments) {
+/// What a search is about: the share that was named, else all of which a folder is indexed. What an engine keeps
+/// besides is of nobody any more.
+struct Scope {
+  std::vector<std::string> shares;
+  bool known = true;     ///< false: the list of folders cannot be read, so that all that the engine has are searched
+  bool searched = true;  ///< false: none was
+  bool stale = false;    ///< some are not known to hold all that was changed before
+  LeftOut left_out;
+};
+
+Scope ReadScope(const Arguments& arguments) {
+  Scope scope;
+  if (arguments.Has("--share")) {
+    scope.shares.push_back(sdk::SDKShare(arguments.Get("--share")).GetName());
+    return scope;
+  }
+  try {
+    const std::set<std::string> indexed = fileindex::FolderMgr().GetIndexedShares();
+    scope.shares.assign(indexed.begin(), indexed.end());
+  } catch (const Error& error) {
+    scope.known = false;
+    scope.left_out.Add("", error.Code(), "those without an index are not known: " + Explain(error));
+  }
+  return scope;
+}
+
+Json::Value SearchRequest(const Arguments& arguments, const Scope& scope) {
   Json::Value data;
   data["query"] = JoinWords(arguments.words);
-  if (arguments.Has("--share")) {
-    data["id"] = fileindex::elastic::GetFileIndexID(sdk::SDKShare(arguments.Get("--share")).GetName());
-  }
+  if (scope.known) data["ids"] = Json::Value(Json::arrayValue);
+  for (const std::string& share : scope.shares) data["ids"].append(fileindex::elastic::GetFileIndexID(share));
   data["limit"] = Json::Int64(arguments.Number("--limit", kLimitDefault, 1, kLimitMax));
   data["offset"] = Json::Int64(arguments.Number("--offset", 0, 0, 1000000000));
   data["sort"] = arguments.Get("--sort", "relevance");
@@ -92,32 +123,64 @@ void PrintSummary(const Json::Value& result, uint64_t offset) {
                result["ranking_bounded"].asBool() ? "; so many match that only a part was ranked" : "");
 }
 
-void PrintNothingFound(const Json::Value& result) {
+void PrintNothingFound(const Json::Value& result, const Scope& scope) {
+  if (!scope.searched) return;
   std::string similar;
   for (const Json::Value& word : result["suggestions"]) {
     if (word.isString()) similar += (similar.empty() ? "; there is: " : ", ") + EscapeForTerminal(word.asString());
   }
-  (void)fprintf(stderr, "nothing found%s\n", similar.c_str());
+  (void)fprintf(stderr, "%s%s\n", scope.left_out.Empty() ? "nothing found" : "no hit in what was searched",
+                similar.c_str());
 }
 
-/// Whether the index is known to hold all that was changed before; says why not.
-bool IsFresh(const Arguments& arguments) try {
+/// Waits until the indices hold all that was changed before. Shares of which that cannot be said leave the search,
+/// unless what they hold by now will do.
+void MakeFresh(const Arguments& arguments, Scope& scope) {
   const bool given = !arguments.Get("--fresh").empty();
-  AwaitChanges(arguments.Get("--share"),
-               std::chrono::seconds(given ? arguments.Number("--fresh", 0, 0, kFreshSecondsMax) : kFreshSeconds));
+  const auto longest =
+      std::chrono::seconds(given ? arguments.Number("--fresh", 0, 0, kFreshSecondsMax) : kFreshSeconds);
+  const bool stale_will_do = arguments.Has("--partial");
+  for (const auto& [share, reason] : AwaitChanges(scope.shares, longest)) {
+    scope.stale = true;
+    scope.left_out.Add(share, 0, reason, stale_will_do);
+    if (!stale_will_do) scope.shares.erase(std::find(scope.shares.begin(), scope.shares.end(), share));
+  }
+}
+
+/// Whether there is anything left to be searched.
+bool IsFresh(const Arguments& arguments, Scope& scope) try {
+  MakeFresh(arguments, scope);
   return true;
 } catch (const Failure& failure) {
-  (void)fprintf(stderr, "fileindexctl: %s\nWithout --fresh the search shows what is indexed by now.\n",
-                EscapeForTerminal(failure.what()).c_str());
-  return false;
+  const bool goes_on = arguments.Has("--partial");
+  (void)fprintf(stderr, "fileindexctl: %s\n%s\n", EscapeForTerminal(failure.what()).c_str(),
+                goes_on ? "What is shown is what is indexed by now." : kWithoutFresh);
+  return goes_on;
+}
+
+/// The engine's answer, also where no share is left to ask it about.
+Json::Value SearchIn(const Arguments& arguments, Scope& scope) {
+  if (scope.known && scope.shares.empty() && !scope.left_out.Empty()) {
+    Json::Value nothing;
+    nothing["total"] = 0;
+    nothing["hits"] = Json::Value(Json::arrayValue);
+    scope.searched = false;
+    return nothing;
+  }
+  Json::Value result = Search(SearchRequest(arguments, scope));
+  scope.searched = scope.shares.empty() || result["left_out"].size() < scope.shares.size();
+  scope.left_out.AddFrom(result["left_out"]);
+  return result;
 }
 
 }  // namespace
 
 int RunSearch(const Arguments& arguments) {
-  const Json::Value request = SearchRequest(arguments);
-  if (arguments.Has("--fresh") && !IsFresh(arguments)) return kNotFresh;
-  const Json::Value result = Search(request);
+  Scope scope = ReadScope(arguments);
+  const Json::Value request = SearchRequest(arguments, scope);
+  if (arguments.Has("--fresh") && !IsFresh(arguments, scope)) return kIncomplete;
+  Json::Value result = SearchIn(arguments, scope);
+  result["left_out"] = scope.left_out.ToJson();
   const uint64_t hits = result["hits"].isArray() ? result["hits"].size() : 0;
   if (arguments.Has("--json")) {
     (void)printf("%s\n", ToScriptJson(result).c_str());
@@ -126,8 +189,13 @@ int RunSearch(const Arguments& arguments) {
     for (const Json::Value& hit : result["hits"]) PrintHit(hit, on_terminal);
     PrintSummary(result, UintOf(request, "offset"));
   } else {
-    PrintNothingFound(result);
+    PrintNothingFound(result, scope);
   }
+  (void)fflush(stdout);
+  scope.left_out.Tell();
+  const bool partial = arguments.Has("--partial");
+  if (scope.stale && !partial) (void)fprintf(stderr, "%s\n", kWithoutFresh);
+  if (!scope.left_out.Empty() && !partial) return kIncomplete;
   return hits > 0 ? kDone : kNothingFound;
 }
 

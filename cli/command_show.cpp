@@ -10,6 +10,7 @@
 #include "cli/escape.h"
 #include "cli/folder_path.h"
 #include "cli/format.h"
+#include "cli/left_out.h"
 #include "common/file_util.h"
 #include "fileindex/elastic/elastic_control.h"
 #include "fileindex/folder_mgr.h"
@@ -106,11 +107,12 @@ void PrintDocument(const Json::Value& document, const std::string& text) {
 }
 
 /// @return whether the file is in the index.
-bool Show(const std::string& file, const Arguments& arguments) {
+bool Show(const std::string& file, const Arguments& arguments, LeftOut& left_out) {
   const std::string share_path = ToSharePath(file, fileindex::FolderMgr());
   const std::string path = fileindex::GetFullPath(share_path);
   const std::string share = fileindex::GetShareNameByPath(share_path);
-  Json::Value documents = Entries(share, QueryOf(path));
+  Json::Value documents;
+  if (!left_out.Unless(share, [&] { documents = Entries(share, QueryOf(path)); })) return false;
   if (documents.empty()) {
     (void)fprintf(stderr, "%s is not in the index; 'fileindexctl index %s' looks for what is not\n",
                   EscapeForTerminal(path).c_str(), EscapeForTerminal(share).c_str());
@@ -164,16 +166,23 @@ uint64_t ListUnread(const std::string& share, bool json) {
 
 int RunShow(const Arguments& arguments) {
   bool all = true;
-  for (const std::string& file : arguments.words) all = Show(file, arguments) && all;
+  LeftOut left_out;
+  for (const std::string& file : arguments.words) all = Show(file, arguments, left_out) && all;
+  left_out.Tell();
+  if (!left_out.Empty()) return kIncomplete;
   return all ? kDone : kNothingFound;
 }
 
 int RunUnread(const Arguments& arguments) {
   uint64_t count = 0;
-  for (const std::string& share : IndexedShares(arguments.words)) count += ListUnread(share, arguments.Has("--json"));
+  LeftOut left_out;
+  for (const std::string& share : IndexedShares(arguments.words)) {
+    (void)left_out.Unless(share, [&] { count += ListUnread(share, arguments.Has("--json")); });
+  }
   if (fflush(stdout) != 0) throw Failure("standard output cannot be written");
   (void)fprintf(stderr, "%s files could not be read, or not all of them\n", Count(count).c_str());
-  return kDone;
+  left_out.Tell();
+  return left_out.Empty() ? kDone : kIncomplete;
 }
 
 }  // namespace ferrox::cli

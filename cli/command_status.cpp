@@ -46,7 +46,9 @@ void PrintShare(const Json::Value& share, const std::string& notification_proble
   PrintWork(share);
   (void)fputs(WatchLines(share, notification_problem).c_str(), stdout);
   const Json::Value& index = share["index"];
-  if (index.isObject()) {
+  if (index.isObject() && index.isMember("error")) {
+    (void)printf("    index: cannot be searched: %s\n", EscapeOneLine(TextOf(index["error"], "msg")).c_str());
+  } else if (index.isObject()) {
     (void)printf("    index: %s documents, %s, %s\n", Count(UintOf(index, "documents")).c_str(),
                  Size(IntOf(index, "bytes_on_disk")).c_str(),
                  IntOf(share, "last_commit") == 0 ? "no change since the daemon started"

@@ -40,26 +40,29 @@ CommandGroup Services() {
 }
 
 CommandGroup Searching() {
-  return {"Searching",
-          {
-              {"search",
-               "QUERY...",
-               {{"--share", "SHARE", "search in this share only"},
-                {"--limit", "N", "show at most so many hits (default 10, at most 1000)"},
-                {"--offset", "N", "leave out the first N hits"},
-                {"--sort", "relevance|date|name|size", "the order (default: relevance)"},
-                {"--fresh", "[=SECONDS]",
-                 "wait until all that was changed before can be found (default 30); exit code 4 when that is not sure"},
-                kJson},
-               "Finds files. All words must match; \"a phrase\", prefix*, OR, NOT and ( ) work, and conditions such as "
-               "kind:image, size:>10M, author:, artist:, duration:>10m, camera:, taken:2023; the manual lists all.",
-               &RunSearch},
-              {"suggest-refresh",
-               "[SHARE...]",
-               {},
-               "Rebuilds what is suggested while a query is typed, for these shares or for all.",
-               &RunSuggestRefresh},
-          }};
+  return {
+      "Searching",
+      {
+          {"search",
+           "QUERY...",
+           {{"--share", "SHARE", "search in this share only"},
+            {"--limit", "N", "show at most so many hits (default 10, at most 1000)"},
+            {"--offset", "N", "leave out the first N hits"},
+            {"--sort", "relevance|date|name|size", "the order (default: relevance)"},
+            {"--fresh", "[=SECONDS]",
+             "wait until all that was changed before can be found (default 30); leaves out what is not sure"},
+            {"--partial", nullptr, "exit code 0 or 1 whatever is left out; with --fresh shows what is not sure too"},
+            kJson},
+           "Finds files. All words must match; \"a phrase\", prefix*, OR, NOT and ( ) work, and conditions such as "
+           "kind:image, size:>10M, author:, artist:, duration:>10m, camera:, taken:2023; the manual lists all. "
+           "Exit code 4: a share was left out.",
+           &RunSearch},
+          {"suggest-refresh",
+           "[SHARE...]",
+           {},
+           "Rebuilds what is suggested while a query is typed, for these shares or for all.",
+           &RunSuggestRefresh},
+      }};
 }
 
 CommandGroup Folders() {

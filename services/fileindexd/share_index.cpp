@@ -129,7 +129,10 @@ class Engine : public ShareIndex {
     const auto result =
         services::AskLocally(InstancePath(kElasticdSocket), toString(Request("index_stat")), longest, text);
     const bool answered = result == services::RequestResult::kAnswered && fromString(reply, text) && reply.isObject();
-    return answered ? reply["data"] : Json::Value();
+    if (!answered || reply["success"] == true) return answered ? reply["data"] : Json::Value();
+    Json::Value refused;
+    refused["error"] = reply["error"];
+    return refused;
   }
 
  private:

@@ -45,8 +45,8 @@ class ShareIndex {
   /// At most `limit` documents, in byte order of their paths from behind `after`, of files with several names that
   /// changed or lost a name under another of them.
   virtual std::vector<IndexedEntry> Suspects(const std::string& after, unsigned limit) = 0;
-  /// The engine's figures: "documents", "bytes_on_disk", "extract_errors" and others. Null when the engine
-  /// does not answer within `longest`.
+  /// The engine's figures: "documents", "bytes_on_disk", "extract_errors" and others; "error" alone when it refuses.
+  /// Null when the engine does not answer within `longest`.
   virtual Json::Value Figures(std::chrono::milliseconds longest) = 0;
 };
 

@@ -63,28 +63,46 @@ SearchRequest ReadSearch(const Json::Value& data) {
   return request;
 }
 
-/// The indices that are asked: one, several, or all that are not paused.
-std::vector<Registry::OpenIndex> ReadIndices(CommandCall& call) {
+/// The indices that are asked: one ("id"), several ("ids"), or all that there are.
+struct AskedIndices {
+  std::vector<Registry::OpenIndex> open;
+  std::string required;  ///< the one that the whole search fails without
+  Json::Value left_out{Json::arrayValue};
+};
+
+/// Notes the index among those that were not searched, so that nobody takes what was found for all that there is. What
+/// is wrong with the request itself fails it.
+void LeaveOut(AskedIndices& asked, const std::string& id, const Error& error) {
+  if (id == asked.required || error.Code() == Error::kEngineBadRequest) throw Error(error);
+  Json::Value entry;
+  entry["id"] = id;
+  entry["code"] = error.Code();
+  entry["reason"] = error.what();
+  asked.left_out.append(std::move(entry));
+}
+
+AskedIndices ReadIndices(CommandCall& call) {
+  AskedIndices asked;
   std::vector<std::string> ids;
   const Json::Value& named = call.data["ids"];
-  if (call.data.isMember("id")) ids.push_back(RequiredText(call.data, "id"));
+  if (call.data.isMember("id")) ids.push_back(asked.required = RequiredText(call.data, "id"));
   if (!IsJsonArray(named)) Refuse("\"ids\" must be an array of index ids");
   for (const Json::Value& id : named) {
     if (!id.isString()) Refuse("\"ids\" must be an array of index ids");
     ids.push_back(id.asString());
   }
-  std::vector<Registry::OpenIndex> indices;
-  indices.reserve(ids.size());
-  for (const std::string& id : ids) indices.push_back(call.registry.Open(id));
-  if (!ids.empty() || named.isArray()) return indices;
-  for (const Registry::Listed& listed : call.registry.List()) {
+  if (ids.empty() && !named.isArray()) {
+    for (const Registry::Listed& listed : call.registry.List()) ids.push_back(listed.id);
+  }
+  asked.open.reserve(ids.size());
+  for (const std::string& id : ids) {
     try {
-      if (!listed.paused) indices.push_back(call.registry.Open(listed.id));
-    } catch (const Error&) {
-      // Logged where it arose; one unusable index does not hide the others' hits.
+      asked.open.push_back(call.registry.Open(id));
+    } catch (const Error& error) {
+      LeaveOut(asked, id, error);
     }
   }
-  return indices;
+  return asked;
 }
 
 /// Whether `a` comes before `b` in the reply.
@@ -128,23 +146,27 @@ std::vector<IndexHit> Merge(std::vector<std::vector<IndexHit>> of_index, const S
 }
 
 /// The page of a search over several indices: the best of each, merged.
-std::vector<IndexHit> SearchAll(const std::vector<Registry::OpenIndex>& indices, const SearchRequest& request,
-                                SearchReply& sums) {
+std::vector<IndexHit> SearchAll(AskedIndices& asked, const SearchRequest& request, SearchReply& sums) {
+  const bool merges = asked.open.size() > 1;
   SearchRequest each = request;
-  if (indices.size() > 1) {
+  if (merges) {
     each.offset = 0;
     each.limit = request.offset + request.limit;
   }
   std::vector<std::vector<IndexHit>> of_index;
-  for (const Registry::OpenIndex& open : indices) {
-    SearchReply reply = open.index->Search(each);
-    sums.total += reply.total;
-    sums.ranking_bounded = sums.ranking_bounded || reply.ranking_bounded;
-    std::vector<IndexHit>& hits = of_index.emplace_back();
-    for (SearchHit& hit : reply.hits) hits.push_back({open.id, std::move(hit)});
-    for (std::string& word : reply.suggestions) sums.suggestions.push_back(std::move(word));
+  for (const Registry::OpenIndex& open : asked.open) {
+    try {
+      SearchReply reply = open.index->Search(each);
+      sums.total += reply.total;
+      sums.ranking_bounded = sums.ranking_bounded || reply.ranking_bounded;
+      std::vector<IndexHit>& hits = of_index.emplace_back();
+      for (SearchHit& hit : reply.hits) hits.push_back({open.id, std::move(hit)});
+      for (std::string& word : reply.suggestions) sums.suggestions.push_back(std::move(word));
+    } catch (const Error& error) {
+      LeaveOut(asked, open.id, error);
+    }
   }
-  if (of_index.size() == 1) return std::move(of_index.front());
+  if (!merges) return of_index.empty() ? std::vector<IndexHit>() : std::move(of_index.front());
   std::vector<IndexHit> hits = Merge(std::move(of_index), request, static_cast<size_t>(each.limit));
   hits.erase(hits.begin(), hits.begin() + std::min<ptrdiff_t>(request.offset, std::ssize(hits)));
   return hits;
@@ -158,12 +180,14 @@ Json::Value RunSearch(CommandCall& call) {
   const QueryNode query = ParseQuery(RequiredText(call.data, "query"), Clock::Get().Now());
   request.query = &query;
   SearchReply sums;
-  std::vector<IndexHit> hits = SearchAll(ReadIndices(call), request, sums);
+  AskedIndices asked = ReadIndices(call);
+  std::vector<IndexHit> hits = SearchAll(asked, request, sums);
   Json::Value result;
   result["total"] = Json::Int64(sums.total);
   result["ranking_bounded"] = sums.ranking_bounded;
   result["hits"] = Json::Value(Json::arrayValue);
   for (IndexHit& hit : hits) result["hits"].append(HitJson(hit));
+  result["left_out"] = std::move(asked.left_out);
   if (sums.total == 0 && !sums.suggestions.empty()) {
     result["suggestions"] = Json::Value(Json::arrayValue);
     std::sort(sums.suggestions.begin(), sums.suggestions.end());

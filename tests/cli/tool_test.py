@@ -45,7 +45,8 @@ class FakeDaemon:
                 request = json.loads(stream.read(struct.unpack("=I", stream.read(4))[0]).rstrip(b"\0"))
                 command = request.get("type") or request["command"]
                 self.asked.append((command, request["data"]))
-                reply = json.dumps(self.answers[command]).encode()
+                answer = self.answers[command]
+                reply = json.dumps(answer(request["data"]) if callable(answer) else answer).encode()
                 stream.write(struct.pack("=I", len(reply)) + reply)
 
     def close(self):
@@ -203,6 +204,51 @@ class ToolTest(unittest.TestCase):
         self.assertLessEqual(left["timeout_ms"], 7000)
         self.assertEqual(2, self.run_tool("search", "--fresh=soon", "x").returncode)
 
+    def test_what_was_left_out_is_told_whatever_was_found(self):
+        hit = {"doc_id": "/v/f", "fields": {}}
+        out = [{"id": "fileindex_photo", "code": 1409, "reason": "paused"}, {"id": "fileindex_gone", "code": 1404, "reason": "?"},
+               {"id": "fileindex_photos", "code": 1407, "reason": "photos.sqlite is damaged"}]
+        told = ["share photo: .*'fileindexctl share resume photo'", "share gone: .*has no index yet", "share photos: photos.sqlite"]
+        for hits, left_out, partial, code in (([hit], [], [], 0), ([hit], out, [], 4), ([], out, [], 4), ([], [], [], 1),
+                                              ([hit], out, ["--partial"], 0), ([], out, ["--partial"], 1)):
+            engine = FakeDaemon(self.root, "kovaelasticd", {"search": success(
+                {"total": len(hits), "hits": hits, "left_out": left_out, "took_us": 1})})
+            with self.subTest(hits=hits, left_out=left_out, partial=partial):
+                shown, json_shown = self.run_tool("search", *partial, "x"), self.run_tool("search", *partial, "--json", "x")
+                engine.close()
+                self.assertEqual([code, code], [shown.returncode, json_shown.returncode])
+                self.assertEqual({"fileindex_gone", "fileindex_photo", "fileindex_photos"}, set(engine.asked[0][1]["ids"]))
+                for line in told if left_out else []:
+                    self.assertRegex(shown.stderr.decode(), line)
+                self.assertEqual(not hits and not left_out, b"nothing found" in shown.stderr)
+                self.assertEqual([entry["id"] for entry in left_out],
+                                 [entry["id"] for entry in json.loads(json_shown.stdout)["left_out"]])
+        # One share is behind: the others are searched, and with --partial that one too.
+        self.daemon("kovanotifyd", sync=success({"problems": []}))
+        for partial, code, asked in (([], 4, 2), (["--partial"], 0, 3)):
+            indexd = FakeDaemon(self.root, "fileindexd", {"sync": lambda data: failure("share gone: it is paused")
+                                                          if "gone" in data["shares"] else success(None)})
+            engine = FakeDaemon(self.root, "kovaelasticd", {"search": success({"total": 1, "hits": [hit], "left_out": []})})
+            done = self.run_tool("search", "--fresh", *partial, "x")
+            engine.close()
+            indexd.close()
+            self.assertEqual((code, asked), (done.returncode, len(engine.asked[0][1]["ids"])), done.stderr)
+            self.assertIn(b"share gone: it is paused", done.stderr)
+            self.assertIn(b"/v/f", done.stdout)
+
+    def test_others_tell_what_they_left_out(self):
+        os.mkdir(f"{self.root}/vol/gone")
+        write_json(f"{self.root}/etc/kova/shares.json",
+                   [{"name": name, "path": f"{self.root}/vol/{name}"} for name in ("gone", "photo", "photos")])
+        paused = {"success": False, "error": {"code": 1409, "msg": "paused"}}
+        self.daemon("kovaelasticd", ping=success({}), commit=success(None), document_get_by_query=lambda data: paused
+                    if data["id"] == "fileindex_photo" else success([{"KOVAMDPath": "/v/bad", "_KOVAExtractError": "torn"}]))
+        for words, found in ((["unread"], b"/v/bad"), (["show", "/photo/trip/a", "/photos/a b/c"], b"/v/bad")):
+            done = self.run_tool(*words)
+            self.assertEqual(4, done.returncode, done.stderr)
+            self.assertIn(found, done.stdout)
+            self.assertRegex(done.stderr.decode(), "left out: share photo: .*'fileindexctl share resume photo'")
+
     def test_hung_daemons_cost_seconds_and_hide_nothing_of_the_others(self):
         shares = [{"share": "photo", "path": "/v/photo", "state": "idle", "failures": {}}]
         answering = {"kovaelasticd": {"ping": success({"pid": 4})}, "kovanotifyd": {"status": success({"pid": 6, "queues": []})},
@@ -247,7 +293,8 @@ class ToolTest(unittest.TestCase):
 
     def test_status_tells_how_changes_are_noticed(self):
         shares = [{"share": name, "path": "/v/" + name, "queue": "/q/" + name, "state": "idle", "oldest_change": 2000,
-                   "failures": {}} for name in ("same", "differ", "none")]
+                   "failures": {}, "index": {"error": {"code": 1407, "msg": name + " is torn"}}}
+                  for name in ("same", "differ", "none")]
         self.daemon("fileindexd", status=success({"pid": 5, "workers": 2, "paused": False, "shares": shares}))
         self.assertIn(b"notification daemon: does not run, so that", self.run_tool("status").stdout)
         folder = {"path": "/v/a", "watch": "inotify", "reason": "fanotify is missing", "covered": True}
@@ -262,7 +309,7 @@ class ToolTest(unittest.TestCase):
         shown = self.run_tool("status").stdout.decode()
         for expected in ("notification daemon: runs, process 6, 9 changes noticed\n    /x cannot be read\n",
                          "    changes by inotify (fanotify is missing)\n    held in memory: 3, the oldest for ",
-                         ": the disk is full\n",
+                         ": the disk is full\n", "index: cannot be searched: none is torn\n",
                          "    changes in /v/a by inotify (fanotify is missing)\n"
                          "    changes in /v/b by fanotify, not yet everywhere\n",
                          "    changes are not noticed, 'fileindexctl index' looks for them: nobody asked"):

@@ -65,11 +65,13 @@ class Instance:
     def share_status(self, name):
         return next(s for s in self.status()["index_daemon"]["shares"] if s["share"] == name)
 
-    def search(self, *words):
-        """The paths found, as bytes, in order."""
+    def search(self, *words, left_out=()):
+        """The paths found, as bytes, in order; just these shares must have been left out."""
         done = self.run("search", "--json", "--limit", "1000", *words)
-        assert done.returncode in (0, 1), done.stderr
-        hits = json.loads(done.stdout)["hits"]
+        assert done.returncode in ((4,) if left_out else (0, 1)), done.stderr
+        result = json.loads(done.stdout)
+        assert [entry["share"] for entry in result["left_out"]] == list(left_out), done.stderr
+        hits = result["hits"]
         return [hit["doc_id"].encode("utf-8", "surrogateescape") for hit in hits]
 
     # The daemons.

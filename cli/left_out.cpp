@@ -1,0 +1,89 @@
+#include "cli/left_out.h"
+
+#include <cstdio>
+
+#include "cli/command.h"
+#include "cli/escape.h"
+#include "cli/format.h"
+#include "common/error.h"
+#include "common/file_util.h"
+#include "fileindex/elastic/elastic_control.h"
+#include "fileindex/folder_mgr.h"
+
+namespace ferrox::cli {
+
+namespace {
+
+using fileindex::elastic::GetFileIndexID;
+
+/// The share of an index; the id itself where it is none of a share.
+std::string ShareOf(const std::string& index_id) {
+  const std::string prefix = GetFileIndexID("");
+  return StringStartWith(index_id, prefix) ? index_id.substr(prefix.size()) : index_id;
+}
+
+bool HasFolders(const std::string& share) try {
+  return fileindex::FolderMgr().IsShareIndexed(share);
+} catch (const Error&) {
+  return true;  // not known: told where the list of folders is needed
+}
+
+/// In the words of the tool, where the engine refused with `code` and `reason`.
+std::string WhyUnusable(const std::string& share, int code, const std::string& reason) {
+  if (code == Error::kEngineIndexPaused)
+    return "it is paused; 'fileindexctl share resume " + share + "' goes on with it";
+  if (code != Error::kEngineNoSuchIndex) return reason;
+  if (!HasFolders(share)) return "no folder of it is indexed; 'fileindexctl folder add /" + share + "' adds all of it";
+  return "it has no index yet; the index daemon makes it, 'fileindexctl status' shows what it does";
+}
+
+}  // namespace
+
+void LeftOut::Add(const std::string& share, int code, const std::string& reason, bool searched) {
+  Json::Value entry;
+  entry["share"] = share;
+  entry["id"] = share.empty() ? "" : GetFileIndexID(share);
+  entry["code"] = code;
+  entry["reason"] = reason;
+  entry["searched"] = searched;
+  for (Json::Value& earlier : list_) {
+    if (earlier["share"] == share) return earlier.swap(entry);
+  }
+  list_.append(std::move(entry));
+}
+
+void LeftOut::AddFrom(const Json::Value& reply) {
+  if (!reply.isArray()) return;
+  for (const Json::Value& entry : reply) {
+    const std::string share = ShareOf(TextOf(entry, "id"));
+    const auto code = static_cast<int>(IntOf(entry, "code"));
+    Add(share, code, WhyUnusable(share, code, TextOf(entry, "reason")));
+  }
+}
+
+bool LeftOut::Unless(const std::string& share, const std::function<void()>& run) {
+  const auto leave_out = [&](int code, const std::string& reason) {
+    Add(share, code, WhyUnusable(share, code, reason));
+    return false;
+  };
+  try {
+    run();
+    return true;
+  } catch (const Refusal& refusal) {
+    return leave_out(refusal.Code(), refusal.Reason());
+  } catch (const Error& error) {
+    if (error.Code() < Error::kEngineBusy || error.Code() >= Error::kTreeInconsistent) throw;
+    return leave_out(error.Code(), error.what());
+  }
+}
+
+void LeftOut::Tell() const {
+  for (const Json::Value& entry : list_) {
+    const std::string share = TextOf(entry, "share");
+    (void)fprintf(stderr, "fileindexctl: %s: %s%s\n", entry["searched"].asBool() ? "may not be up to date" : "left out",
+                  share.empty() ? "" : ("share " + EscapeForTerminal(share) + ": ").c_str(),
+                  EscapeOneLine(TextOf(entry, "reason")).c_str());
+  }
+}
+
+}  // namespace ferrox::cli
