@@ -13,6 +13,7 @@
 #include "common/log.h"
 #include "common/unique_fd.h"
 #include "services/fileindexd/file_count.h"
+#include "services/fileindexd/queue_tail.h"
 #include "services/fileindexd/stray_documents.h"
 
 namespace ferrox::indexd {
@@ -83,6 +84,7 @@ void OperationRunner::Run(const std::function<void(const std::function<void(cons
   StopFollowing();
   follower_.Check();
   LookAtWrittenAhead();
+  RefreshChangedFiles();
   RefreshSuspects();
   Commit();
 }
@@ -265,14 +267,34 @@ void OperationRunner::Compare(const std::string& path) {
   S_ISDIR(status.st_mode) ? CompareFolder(path) : RemoveBelow(path);
 }
 
-/// A file with several names is told of under one of them. Once through them: what cannot be refreshed stays.
+/// Of a change under a name that is outside of the share, or is gone, only the file's number is told.
+void OperationRunner::RefreshChangedFiles() {
+  if (context_.changed_files.size() > kChangedNumbersMax) return;  // all is compared
+  const auto is_current = [this](const IndexedEntry& entry) {
+    struct stat status = {};
+    return LookAt(entry.path, status) == Presence::kThere && writer_.IsCurrent(entry, status);
+  };
+  for (const uint64_t file : context_.changed_files) {
+    RefreshPages([&](const std::string& after, unsigned limit) { return context_.index.OfFile(file, after, limit); },
+                 is_current);
+  }
+}
+
+/// A file with several names is told of under one of them.
 void OperationRunner::RefreshSuspects() {
+  RefreshPages([this](const std::string& after, unsigned limit) { return context_.index.Suspects(after, limit); },
+               [](const IndexedEntry&) { return false; });
+}
+
+/// Once through them: what cannot be refreshed stays.
+void OperationRunner::RefreshPages(const ListPage& list, const std::function<bool(const IndexedEntry&)>& leave) {
   constexpr unsigned kPage = 1000;
   std::string after;
   for (size_t found = kPage; found == kPage;) {
-    const std::vector<IndexedEntry> page = context_.index.Suspects(after, kPage);
+    context_.interruption.Check();
+    const std::vector<IndexedEntry> page = list(after, kPage);
     for (const IndexedEntry& entry : page) {
-      tasks_.Submit([this, path = entry.path] { writer_.RefreshAttributes(path); });
+      if (!leave(entry)) tasks_.Submit([this, path = entry.path] { writer_.RefreshAttributes(path); });
     }
     tasks_.Wait();
     CommitIfDue();

@@ -3,6 +3,7 @@
 #include <sys/stat.h>
 
 #include <chrono>
+#include <cstdint>
 #include <functional>
 #include <set>
 #include <string>
@@ -38,6 +39,8 @@ struct PassContext {
   const HeldFolder& held;  ///< the share's folder
   const std::string& queue_path;
   std::chrono::milliseconds keep_up_interval;
+  /// Numbers of files that changed under names that tell nothing of the share's own.
+  const std::set<uint64_t>& changed_files;
   /// Files that a pass wrote ahead of the pass that has their lines, which looks at them again. Kept by the worker.
   std::set<std::string>& written_ahead;
 };
@@ -72,6 +75,7 @@ class OperationRunner {
 
  private:
   using Place = PathRules::Place;
+  using ListPage = std::function<std::vector<IndexedEntry>(const std::string& after, unsigned limit)>;
   struct Handler;
   static const Handler kHandlers[];
   enum class Stage { kMove, kLook };
@@ -99,7 +103,9 @@ class OperationRunner {
   void Compare(const std::string& path);
   void CompareRoot();
   void RemoveStrays();
+  void RefreshChangedFiles();
   void RefreshSuspects();
+  void RefreshPages(const ListPage& list, const std::function<bool(const IndexedEntry&)>& leave);
   void RemoveTree(const std::string& path);
   void RemoveBelow(const std::string& folder);
   void CompareOne(const std::string& path, Place place, const struct stat& status);

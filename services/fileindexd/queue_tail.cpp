@@ -3,7 +3,10 @@
 #include <fcntl.h>
 #include <unistd.h>
 
-#include <set>
+#include <functional>
+#include <utility>
+
+#include <json/value.h>
 
 #include "common/error.h"
 #include "common/unique_fd.h"
@@ -27,22 +30,58 @@ void TakeChangedFile(const std::string& line, std::set<std::string>& files) {
   }
 }
 
+/// So the lines begin that tell files by their numbers: a queue may be long, and few of its lines are such.
+constexpr char kNumbersBegin[] = "{\"event\":0,";
+
+void TakeNumbers(const std::string& line, std::set<uint64_t>& files) {
+  try {
+    const fileindex::Event event(line);
+    if (!event.data.isObject() || !event.data["files"].isArray()) return;
+    for (const Json::Value& file : event.data["files"]) {
+      if (file.isUInt64() && files.size() <= kChangedNumbersMax) files.insert(file.asUInt64());
+    }
+  } catch (const Error&) {
+    // Logged by the reader of the queue's other lines.
+  }
+}
+
+/// Hands out whole lines of one piece of a queue file from an offset on, until `take` has enough. @return the offset
+/// behind the last; as it was at the end.
+off_t ReadQueueLines(const std::string& path, off_t at, const std::function<bool(const std::string& line)>& take) {
+  const UniqueFd file(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK));
+  std::string chunk(kChunkBytes, '\0');
+  const ssize_t size = file.Valid() ? pread(file.Get(), chunk.data(), chunk.size(), at) : 0;
+  chunk.resize(size > 0 ? static_cast<size_t>(size) : 0);
+  size_t begin = 0;
+  for (size_t end = 0; (end = chunk.find('\n', begin)) != std::string::npos;) {
+    const bool is_more = take(chunk.substr(begin, end - begin));
+    begin = end + 1;
+    if (!is_more) break;
+  }
+  const bool overlong = begin == 0 && chunk.size() == kChunkBytes;
+  return at + static_cast<off_t>(overlong ? kChunkBytes : begin);
+}
+
 }  // namespace
 
 std::vector<std::string> QueueTail::NextChangedFiles() {
   std::set<std::string> files;
-  const UniqueFd file(open(path_.c_str(), O_RDONLY | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK));
-  std::string chunk(kChunkBytes, '\0');
-  const ssize_t size = file.Valid() ? pread(file.Get(), chunk.data(), chunk.size(), read_) : 0;
-  chunk.resize(size > 0 ? static_cast<size_t>(size) : 0);
-  size_t begin = 0;
-  for (size_t end = 0; files.size() < kFilesAtOnce && (end = chunk.find('\n', begin)) != std::string::npos;) {
-    TakeChangedFile(chunk.substr(begin, end - begin), files);
-    begin = end + 1;
-  }
-  const bool overlong = begin == 0 && chunk.size() == kChunkBytes;
-  read_ += static_cast<off_t>(overlong ? kChunkBytes : begin);
+  read_ = ReadQueueLines(path_, read_, [&files](const std::string& line) {
+    TakeChangedFile(line, files);
+    return files.size() < kFilesAtOnce;
+  });
   return {files.begin(), files.end()};
+}
+
+std::set<uint64_t> ChangedNumbersIn(const std::string& queue_path) {
+  std::set<uint64_t> files;
+  for (off_t at = 0, before = -1; at != std::exchange(before, at);) {
+    at = ReadQueueLines(queue_path, at, [&files](const std::string& line) {
+      if (line.starts_with(kNumbersBegin)) TakeNumbers(line, files);
+      return true;
+    });
+  }
+  return files;
 }
 
 }  // namespace ferrox::indexd

@@ -2,6 +2,9 @@
 
 #include <sys/types.h>
 
+#include <cstddef>
+#include <cstdint>
+#include <set>
 #include <string>
 #include <vector>
 
@@ -21,5 +24,11 @@ class QueueTail {
   std::string path_;
   off_t read_ = 0;
 };
+
+/// So many files are looked up by their numbers; of more, the whole share is compared.
+inline constexpr size_t kChangedNumbersMax = 10000;
+
+/// The numbers by which the lines of a queue call files changed, at most one more than kChangedNumbersMax.
+std::set<uint64_t> ChangedNumbersIn(const std::string& queue_path);
 
 }  // namespace ferrox::indexd

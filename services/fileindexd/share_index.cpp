@@ -116,11 +116,11 @@ class Engine : public ShareIndex {
   }
 
   std::vector<IndexedEntry> Suspects(const std::string& after, unsigned limit) override {
-    Json::Value query;
-    query["qsl"]["suspects"] = true;
-    query["limit"] = limit;
-    if (!after.empty()) query["after"] = after;
-    return Query(std::move(query));
+    return Page("suspects", true, after, limit);
+  }
+
+  std::vector<IndexedEntry> OfFile(uint64_t file, const std::string& after, unsigned limit) override {
+    return Page("file", Json::UInt64(file), after, limit);
   }
 
   Json::Value Figures(std::chrono::milliseconds longest) override {
@@ -141,6 +141,15 @@ class Engine : public ShareIndex {
     request["command"] = command;
     request["data"]["id"] = id_;
     return request;
+  }
+
+  std::vector<IndexedEntry> Page(const char* which, const Json::Value& value, const std::string& after,
+                                 unsigned limit) const {
+    Json::Value query;
+    query["qsl"][which] = value;
+    query["limit"] = limit;
+    if (!after.empty()) query["after"] = after;
+    return Query(std::move(query));
   }
 
   std::vector<IndexedEntry> Query(Json::Value query) const {

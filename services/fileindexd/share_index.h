@@ -1,6 +1,7 @@
 #pragma once
 
 #include <chrono>
+#include <cstdint>
 #include <memory>
 #include <string>
 #include <vector>
@@ -45,6 +46,8 @@ class ShareIndex {
   /// At most `limit` documents, in byte order of their paths from behind `after`, of files with several names that
   /// changed or lost a name under another of them.
   virtual std::vector<IndexedEntry> Suspects(const std::string& after, unsigned limit) = 0;
+  /// At most `limit` documents, in byte order of their paths from behind `after`, of the file of that number.
+  virtual std::vector<IndexedEntry> OfFile(uint64_t file, const std::string& after, unsigned limit) = 0;
   /// The engine's figures: "documents", "bytes_on_disk", "extract_errors" and others; "error" alone when it refuses.
   /// Null when the engine does not answer within `longest`.
   virtual Json::Value Figures(std::chrono::milliseconds longest) = 0;

@@ -24,6 +24,7 @@
 #include "sdk/share.h"
 #include "services/fileindexd/operation_runner.h"
 #include "services/fileindexd/path_rules.h"
+#include "services/fileindexd/queue_tail.h"
 #include "services/fileindexd/stray_documents.h"
 
 namespace ferrox::indexd {
@@ -409,9 +410,10 @@ void ShareWorker::RunPass() {
   if (!queue.PrepareTmpQueue() && !IsFileExist(queue_path_ + ".tmp")) return;
   // Only now: of folders that are changed later, the events are in a later queue.
   const ShareFolders folders = LoadFolders();
+  const std::set<uint64_t> changed_files = ChangedNumbersIn(queue_path_ + ".tmp");
   OperationRunner runner({share_, root_, folders, *index_, environment_.pool, interruption_, status_, held, queue_path_,
-                          environment_.keep_up_interval, written_ahead_});
-  RunOperations(queue, runner, folders);
+                          environment_.keep_up_interval, changed_files, written_ahead_});
+  RunOperations(queue, runner, folders, changed_files.size() > kChangedNumbersMax);
   // What went away in the meantime, with its volume for example, looked as if it had been deleted.
   runner.CheckRoot();
   CheckShare();
@@ -427,12 +429,15 @@ void ShareWorker::RunPass() {
 /// Where the folders differ from those that the index is in line with is compared, too: a reindex that waits in the
 /// queue swallows the event of a folder, or of a user, that was renamed into its place, and so what is to be done at
 /// the old one.
-void ShareWorker::RunOperations(fileindex::QueueMgr& queue, OperationRunner& runner, const ShareFolders& folders) {
+void ShareWorker::RunOperations(fileindex::QueueMgr& queue, OperationRunner& runner, const ShareFolders& folders,
+                                bool whole_share) {
   const auto each = [&queue](const std::function<void(const fileindex::OP&)>& take) {
     (void)queue.ProcessOP([&take](const std::shared_ptr<fileindex::OP>& op) { take(*op); }, true);
   };
+  std::vector<std::string> also_compare = folders.DifferingFrom(applied_.Get());
+  if (whole_share) also_compare.push_back(root_);
   try {
-    runner.Run(each, folders.DifferingFrom(applied_.Get()));
+    runner.Run(each, also_compare);
   } catch (const Interrupted&) {
     runner.KeepWhatIsDone();
     throw;

@@ -120,7 +120,8 @@ class ShareWorker {
   bool Queue(int event, const std::string& path);
   void AwaitFreeQueue();
   void RunPass();
-  void RunOperations(fileindex::QueueMgr& queue, OperationRunner& runner, const ShareFolders& folders);
+  void RunOperations(fileindex::QueueMgr& queue, OperationRunner& runner, const ShareFolders& folders,
+                     bool whole_share);
   ShareFolders LoadFolders();
   bool AreStill(const ShareFolders& folders);
   void QueueAgainIfChanged(const OperationRunner& runner, const ShareFolders& folders);

@@ -129,6 +129,8 @@ GetRequest ReadQuery(const Json::Value& query) {
   request.suspects = is_true("suspects");
   request.unread = is_true("unread");
   if (request.suspects || request.unread) return request;
+  if (qsl["file"].isUInt64() && qsl.size() == 1) request.file = qsl["file"].asUInt64();
+  if (request.file != 0) return request;
   const Json::Value& prefix = qsl["prefix"];
   const Json::Value& term = qsl["term"];
   const bool one = prefix.isNull() != term.isNull() && qsl.size() == 1;

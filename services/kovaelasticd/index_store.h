@@ -13,8 +13,8 @@
 
 namespace ferrox::engine {
 
-/// Which documents Get lists: the one at `term`, or the suspects, or the unread, or those whose path begins with
-/// `prefix`, in the order of their paths.
+/// Which documents Get lists: the one at `term`, or the suspects, or the unread, or those of `file`, or those whose
+/// path begins with `prefix`, in the order of their paths.
 struct GetRequest {
   std::string term;
   std::string prefix;
@@ -24,6 +24,7 @@ struct GetRequest {
   /// Documents that may not know of a change of their file, which was told of under another of its names.
   bool suspects = false;
   bool unread = false;  ///< documents with "_KOVAExtractError"
+  uint64_t file = 0;    ///< the number at the end of "_KOVAStamp"; 0: not asked for
 };
 
 enum class SortKey { kRelevance, kDate, kName, kSize };

@@ -208,11 +208,14 @@ void SqliteStore::Get(const GetRequest& request, const std::function<void(const 
     if (stored.has_value()) take(LoadEntry(*stored, request.fields));
     return;
   }
-  if (request.suspects || request.unread) {
-    const char* condition = request.suspects ? "id IN (SELECT id FROM suspects)" : "error IS NOT NULL";
+  if (request.suspects || request.unread || request.file != 0) {
+    const char* condition = request.suspects ? "id IN (SELECT id FROM suspects)"
+                            : request.unread ? "error IS NOT NULL"
+                                             : "id IN (SELECT id FROM files WHERE file = ?3)";
     Statement statement =
         writer_.Prepare(std::string(kSelectRow) + "WHERE " + condition + " AND path > ?1 ORDER BY path LIMIT ?2");
     statement.Bind(1, std::string_view(request.after)).Bind(2, request.limit);
+    if (!request.suspects && !request.unread) statement.Bind(3, static_cast<int64_t>(request.file));
     while (statement.Step()) take(LoadEntry(ReadRow(statement), request.fields));
     return;
   }

@@ -64,6 +64,10 @@ TEST_F(IndexStoreTest, OtherNamesOfAChangedFileAreSuspects) {
   Put(stamped("/b", "1.1.3.77"));
   store_->Commit();
   Reopen();
+  GetRequest of_file;
+  of_file.file = 77;
+  of_file.after = "/a";
+  EXPECT_EQ("/b|/c|", List(of_file)) << "all names of the file behind the first";
   EXPECT_EQ("/c|", suspects());
   Json::Value change;
   change["KOVAMDPath"] = "/moved";

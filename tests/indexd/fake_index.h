@@ -109,6 +109,16 @@ class FakeIndex : public indexd::ShareIndex {
     return page;
   }
 
+  std::vector<indexd::IndexedEntry> OfFile(uint64_t file, const std::string& after, unsigned limit) override {
+    const std::lock_guard lock(mutex);
+    std::vector<indexd::IndexedEntry> page;
+    for (auto at = documents.upper_bound(after); at != documents.end() && page.size() < limit; ++at) {
+      if (!at->second.stamp.ends_with("." + std::to_string(file))) continue;
+      page.push_back({at->first, at->second.stamp, at->second.with_content});
+    }
+    return page;
+  }
+
   Json::Value Figures(std::chrono::milliseconds) override { return Json::Value(); }
 
   std::mutex mutex;

@@ -1,6 +1,7 @@
 """Changes on the disk are found by the next fresh search, whatever way of watching there is, and whatever stands in the
 way of the daemons meanwhile."""
 
+import contextlib
 import json
 import mmap
 import os
@@ -306,6 +307,38 @@ class LiveTest(unittest.TestCase):
         self.assertLessEqual(len(lines), 2, lines)
         self.instance.ctl("up")
         self.expect_index_is_disk()
+
+    def test_writes_through_names_that_say_nothing_of_the_others(self):
+        docs, media, outside = self.use_way("fanotify")
+        names = [f"{docs}/b.txt", f"{media}/b.txt", f"{outside}/b.txt"]
+        write(f"{docs}/a.txt", "begin")
+        for number in range(50):
+            write(f"{docs}/other{number}.txt", "other")
+        self.expect_index_is_disk()
+
+        def written():
+            return sum(share["written"] for share in self.instance.status()["index_daemon"]["shares"])
+        leave = (os.remove, lambda name: os.rename(name, f"{outside}/c.txt"), lambda name: None)
+        for name, go in ((name, go) for name in names for go in leave):
+            for turn in range(10):
+                before = written()
+                os.kill(self.instance.pid("kovanotifyd"), signal.SIGSTOP)
+                os.link(f"{docs}/a.txt", name)
+                write(name, f"turn {turn} of {name}")
+                go(name)
+                os.kill(self.instance.pid("kovanotifyd"), signal.SIGCONT)
+                if turn == 9:  # what was queued is not lost
+                    os.kill(self.instance.pid("fileindexd"), signal.SIGSTOP)
+                    self.instance.notifyd("sync", timeout_ms=10000)
+                    self.instance.kill("fileindexd", signal.SIGKILL)
+                    self.instance.ctl("up")
+                    before = 0
+                self.expect_index_is_disk(f"after {name}")
+                self.assertLessEqual(written() - before, 4, "only documents of the file are written")
+                for gone in (name, f"{outside}/c.txt"):
+                    with contextlib.suppress(FileNotFoundError):
+                        os.remove(gone)
+        self.assertEqual(0, self.instance.notifyd()["lost"])
 
     def test_idle_instance_does_nothing(self):
         if os.geteuid() == 0:  # a file system of its own, since a mark on one tells of all that happens there

@@ -43,8 +43,8 @@ class Notebook : public WatchListener {
   explicit Notebook(std::string top) : top_(std::move(top)) {}
 
   void OnChange(Change change) override {
-    static const char* const kWords[] = {"created", "modified", "written",  "attributes",
-                                         "deleted", "renamed",  "uncertain"};
+    static const char* const kWords[] = {"created", "modified", "written", "attributes",
+                                         "deleted", "renamed",  "number",  "uncertain"};
     const std::string old = change.old_path.empty() ? "" : Short(change.old_path) + " ";
     Note(kWords[static_cast<int>(change.kind)] + std::string(change.is_folder ? "/ " : " ") + old + Short(change.path));
     changes.push_back(std::move(change));
@@ -178,6 +178,43 @@ TEST_F(FilesystemWatcherTest, TellsWhatHappened) {
   EXPECT_THAT(Told(), IsEmpty());
 }
 
+TEST_F(FilesystemWatcherTest, AFileIsToldByItsNumberWhenItsNameTellsNothingOfTheOthers) {
+  const std::string a = Root() + "/a";
+  const std::string inside = Root() + "/b";
+  const std::string outside = dir_ / "b";
+  const auto link = [&a](const std::string& name) {
+    fs::create_hard_link(a, name);
+    WriteFile(name, "through the other name");
+  };
+  struct Row {
+    const char* what;
+    std::function<void()> act;
+    bool told;
+  };
+  const std::vector<Row> rows = {
+      {"new", [&] { WriteFile(a, "1"); }, false},
+      {"one name", [&] { WriteFile(a, "2"), (void)chmod(a.c_str(), 0600); }, false},
+      {"gone inside", [&] { link(inside), fs::remove(inside); }, true},
+      {"moved out", [&] { link(inside), fs::rename(inside, outside); }, true},
+      {"mode outside", [&] { (void)chmod(outside.c_str(), 0640); }, true},
+      {"replaced", [&] { WriteFile(inside, "2"), fs::rename(inside, outside); }, false},
+      {"replaced after a write", [&] { fs::remove(outside), link(outside), fs::rename(a, inside); }, true},
+      {"one name again", [&] { fs::remove(outside), fs::rename(inside, a), WriteFile(a, "3"); }, false},
+      {"gone outside", [&] { link(outside), fs::remove(outside); }, true},
+      {"others", [&] { WriteFile(outside, "4"), WriteFile(outside, "5"), fs::rename(outside, dir_ / "c"); }, false},
+  };
+  for (const Row& row : rows) {
+    SCOPED_TRACE(row.what);
+    notes_.changes.clear();
+    row.act();
+    const std::vector<std::string> told = Told();
+    EXPECT_EQ(row.told, std::count(told.begin(), told.end(), "number r") > 0) << testing::PrintToString(told);
+    struct stat status = {};
+    (void)(stat(a.c_str(), &status) == 0 || stat(inside.c_str(), &status) == 0);
+    for (const Change& change : notes_.changes) EXPECT_EQ(change.file != 0 ? status.st_ino : 0, change.file);
+  }
+}
+
 TEST_F(FilesystemWatcherTest, NamesInDoubtAreToldWhenTheKernelJoinsRecords) {
   const std::string a = Root() + "/a";
   const std::string b = Root() + "/b";
@@ -249,6 +286,8 @@ class BelievedTree {
       case Change::Kind::kRenamed:
         if (is_strict && names_.count(change.old_path) == 0) return "not there: " + change.old_path;
         Move(change.old_path, change.path, change.is_folder);
+        break;
+      case Change::Kind::kByNumber:
         break;
       case Change::Kind::kUncertain:
         if (is_strict) return "in doubt: " + change.path;

@@ -29,6 +29,7 @@ Change Modified(const std::string& path) { return {Kind::kModified, false, path}
 Change Written(const std::string& path) { return {Kind::kWritten, false, path}; }
 Change Attributes(const std::string& path) { return {Kind::kAttributes, false, path}; }
 Change Deleted(const std::string& path, bool is_folder = false) { return {Kind::kDeleted, is_folder, path}; }
+Change ByNumber(uint64_t file) { return {Kind::kByNumber, false, "/v", {}, file}; }
 Change Renamed(const std::string& from, const std::string& to, bool is_folder = false) {
   return {Kind::kRenamed, is_folder, to, from};
 }
@@ -303,6 +304,24 @@ TEST_F(QueueRouterTest, NamesWithAnyBytesReachTheReader) {
   const fileindex::Event event(line);
   EXPECT_EQ(event.path, "/v/" + any);
   EXPECT_EQ(event.path_old, old_path);
+}
+
+TEST_F(QueueRouterTest, FilesToldByNumberAreOneLineOrAComparison) {
+  const std::string numbered = LinesOf({Written("/v/a"), ByNumber(8), ByNumber(7), ByNumber(8)});
+  EXPECT_EQ("2 /v/a 0 /v/ ", numbered);
+  EXPECT_NE(std::string::npos, test::ReadFile(queue_).find(R"("data":{"files":[7,8]}})"));
+  std::vector<Change> many;
+  for (uint64_t file = 1; file <= 20000; ++file) many.push_back(ByNumber(file));
+  EXPECT_EQ("10000 /v/ 0 /v/ ", LinesOf(many)) << "in bounded memory";
+
+  (void)remove(queue_.c_str());
+  for (int turn = 0; turn < 10; ++turn, now_ += milliseconds(400)) {
+    Put({ByNumber(9)});
+    (void)router_.Flush(now_);
+  }
+  EXPECT_EQ("", Lines(queue_)) << "while it is written to";
+  (void)router_.Flush(now_ + milliseconds(500));
+  EXPECT_EQ("0 /v/ ", Lines(queue_));
 }
 
 }  // namespace ferrox::notifyd

@@ -62,8 +62,8 @@ class WatcherRecorder : public notifyd::WatchListener {
     return path.compare(0, top_.size(), top_) == 0 ? path.substr(top_.size()) : path;
   }
   std::string Text(const notifyd::Change& change) const {
-    constexpr const char* kNames[] = {"created", "modified", "written",  "attributes",
-                                      "deleted", "renamed",  "uncertain"};
+    constexpr const char* kNames[] = {"created", "modified", "written", "attributes",
+                                      "deleted", "renamed",  "number",  "uncertain"};
     std::string text = kNames[static_cast<int>(change.kind)];
     if (!change.old_path.empty()) text += " " + Short(change.old_path) + " ->";
     return text + " " + Short(change.path) + (change.is_folder ? "/" : "");

@@ -21,6 +21,8 @@ using Kind = Change::Kind;
 
 constexpr uint64_t kMask = FAN_CREATE | FAN_DELETE | FAN_RENAME | FAN_MODIFY | FAN_CLOSE_WRITE | FAN_ATTRIB | FAN_ONDIR;
 constexpr uint64_t kCookieMask = FAN_ATTRIB | FAN_EVENT_ON_CHILD;
+// What changes in the file, rather than in its names.
+constexpr uint64_t kFileMask = FAN_MODIFY | FAN_CLOSE_WRITE | FAN_ATTRIB;
 // Not renames, which may lead out of a quiet folder, nor the cookie's times.
 constexpr uint64_t kQuietMask = FAN_CREATE | FAN_DELETE | FAN_MODIFY | FAN_CLOSE_WRITE;
 // How often Read looks for more before it tells of names in doubt, which it would rather do when nothing is waiting.
@@ -45,7 +47,8 @@ FilesystemWatcher::FilesystemWatcher(Options options)
       mounts_(group_),
       cache_(options_.folders_max),
       locator_(cache_, window_, *this),
-      roots_(cache_) {}
+      roots_(cache_),
+      linked_(mounts_) {}
 
 FilesystemWatcher::~FilesystemWatcher() = default;
 
@@ -115,6 +118,7 @@ std::string FilesystemWatcher::MarkFileSystem(const std::string& root, int folde
   if (!reason.empty()) return reason;
   // The file system may have been away, and changed elsewhere, or be seen by another mount now.
   cache_.Clear();
+  linked_.Clear();
   FolderPlace place;
   const Answer answer = ReadPlace(key, place);
   const Folder* found = locator_.Locate(key);
@@ -183,6 +187,7 @@ bool FilesystemWatcher::Read(WatchListener& listener) {
 /// Nothing is waiting: what only a burst takes is given back, since a daemon that has nothing to do is to be small.
 void FilesystemWatcher::Rest() {
   history_.Clear();
+  linked_.Rest();
   removed_.clear();
   if (std::exchange(was_burst_, false)) (void)malloc_trim(0);
 }
@@ -213,6 +218,7 @@ void FilesystemWatcher::Lose(WatchListener& listener) {
   is_overrun_ = false;
   cache_.Clear();
   history_.Clear();
+  linked_.Clear();
   listener.OnLost();
   for (const std::string& root : roots_.Paths()) {
     listener.OnRootDisturbed(root);
@@ -225,8 +231,8 @@ void FilesystemWatcher::Take(const FanRecord& record, WatchListener& listener) {
   if ((record.mask & FAN_ATTRIB) != 0 && record.name == cookie_name_ && record.folder == cookie_folder_) {
     return listener.OnCookie();
   }
-  // Without a folder it is the number of links of a file that changed; the name that came or went tells of it too.
-  if (record.folder.empty()) return;
+  // It is the number of links of a file that changed; the name that came or went tells of it too.
+  if (record.folder.empty()) return linked_.OnLinks(record.target);
   if ((record.mask & FAN_RENAME) != 0) {
     TakeRename(record, listener);
   } else {
@@ -247,6 +253,7 @@ void FilesystemWatcher::TakeName(const FanRecord& record, WatchListener& listene
     if ((mask & FAN_DELETE) != 0 && removed_.size() < options_.records_max) removed_[record.target] = place;
   }
   if (is_in_quiet && (mask & kQuietMask) != 0) Silence(record);
+  if (!is_in_quiet && !record.IsFolder() && (mask & kFileMask) != 0) TellByNumber(record, listener);
   if (paths_.empty()) return;
   history_.NoteName(record.target);
 
@@ -268,6 +275,16 @@ void FilesystemWatcher::TakeName(const FanRecord& record, WatchListener& listene
       Tell(listener, Kind::kModified, record, path);
     }
     if ((mask & FAN_ATTRIB) != 0) Tell(listener, Kind::kAttributes, record, path);
+  }
+}
+
+/// A root's queue may have the file under another name.
+void FilesystemWatcher::TellByNumber(const FanRecord& record, WatchListener& listener) {
+  const std::optional<uint64_t> file = linked_.NumberToTell(record);
+  if (!file.has_value()) return TellUnknown(record.folder, listener);
+  if (*file == 0) return;
+  for (const std::string& root : roots_.PathsOn(record.target)) {
+    listener.OnChange({Kind::kByNumber, false, root, {}, *file});
   }
 }
 

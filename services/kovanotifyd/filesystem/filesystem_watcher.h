@@ -9,6 +9,7 @@
 #include "services/kovanotifyd/fan_group.h"
 #include "services/kovanotifyd/filesystem/folder_cache.h"
 #include "services/kovanotifyd/filesystem/folder_locator.h"
+#include "services/kovanotifyd/filesystem/linked_files.h"
 #include "services/kovanotifyd/filesystem/mounted_folders.h"
 #include "services/kovanotifyd/filesystem/record_window.h"
 #include "services/kovanotifyd/filesystem/rename_history.h"
@@ -18,8 +19,9 @@
 namespace ferrox::notifyd {
 
 /// Watches roots by one mark for each file system that they are on, so that a root costs nothing however many folders
-/// it has. The kernel then tells of everything on the file system; what is outside of all roots is dropped here, and
-/// what is in the daemons' own folders mostly before it gets here. Names to ignore are reported all the same. Paths are
+/// it has. The kernel then tells of everything on the file system; what is outside of all roots is dropped here,
+/// unless it may be a change of a file with another name below a root (LinkedFiles), and what is in the daemons' own
+/// folders mostly before it gets here. Names to ignore are reported all the same. Paths are
 /// those of the moment of each change, however far the reader is behind (FolderLocator). Only names to which something
 /// returned while records were waiting can be told wrongly; they are then reported as kUncertain.
 class FilesystemWatcher : public Watcher, private FolderSource {
@@ -65,6 +67,7 @@ class FilesystemWatcher : public Watcher, private FolderSource {
   // One record.
   void Take(const FanRecord& record, WatchListener& listener);
   void TakeRename(const FanRecord& record, WatchListener& listener);
+  void TellByNumber(const FanRecord& record, WatchListener& listener);
   void TakeName(const FanRecord& record, WatchListener& listener);
   void Disturb(const FanRecord& record, WatchListener& listener);
   void Silence(const FanRecord& record);
@@ -80,6 +83,7 @@ class FilesystemWatcher : public Watcher, private FolderSource {
   FolderLocator locator_;
   WatchedRoots roots_;
   RenameHistory history_;
+  LinkedFiles linked_;
 
   std::map<std::string, WatchRoot> to_add_;
   /// Folders that were told to be made and removed by one record, while what was done in them is still to come.

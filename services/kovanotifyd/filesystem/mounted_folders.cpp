@@ -156,6 +156,13 @@ FolderSource::Answer MountedFolders::ReadPlaceBy(int mount, const HandleKey& fol
   return FolderSource::Answer::kPlace;
 }
 
+uint64_t MountedFolders::NumberOf(const HandleKey& folder, std::string_view name) {
+  const UniqueFd fd = Open(folder, O_PATH | O_DIRECTORY);
+  struct stat found = {};
+  const bool is_there = fd.Valid() && fstatat(fd.Get(), std::string(name).c_str(), &found, AT_SYMLINK_NOFOLLOW) == 0;
+  return is_there ? found.st_ino : 0;
+}
+
 std::optional<bool> MountedFolders::HasName(const HandleKey& folder, std::string_view name) {
   const UniqueFd fd = Open(folder, O_PATH | O_DIRECTORY);
   if (!fd.Valid()) return {};

@@ -1,6 +1,7 @@
 #pragma once
 
 #include <cstddef>
+#include <cstdint>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -29,7 +30,9 @@ class MountedFolders {
   FolderSource::Answer ReadPlace(const HandleKey& folder, FolderPlace& place);
   /// Whether the name is in the folder; nothing when the folder cannot be opened.
   std::optional<bool> HasName(const HandleKey& folder, std::string_view name);
-  /// Opens the folder by whichever mount of its file system is there.
+  /// The number of what the name in the folder stands for; 0 when there is none.
+  uint64_t NumberOf(const HandleKey& folder, std::string_view name);
+  /// Opens the folder or file by whichever mount of its file system is there.
   UniqueFd Open(const HandleKey& folder, int flags);
 
  private:

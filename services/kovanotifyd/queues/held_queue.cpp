@@ -12,6 +12,8 @@
 #include "common/line_file.h"
 #include "common/lock_file.h"
 #include "common/log.h"
+#include "fileindex/optree.h"
+#include "services/kovanotifyd/queues/queue_line.h"
 
 namespace ferrox::notifyd {
 
@@ -22,6 +24,8 @@ using std::chrono::milliseconds;
 constexpr milliseconds kFirstPause{100};
 constexpr milliseconds kLongestPause{5000};
 constexpr milliseconds kTellingPause{1600};
+/// As many numbers as a line can have, and more than are ever told but by a whole tree of links.
+constexpr size_t kFilesMax = 5000;
 constexpr size_t kBytesAtOnce = 1U << 20;
 constexpr char kLockHeld[] = "its lock is held elsewhere";
 constexpr int kLockAttempts = 20;
@@ -35,13 +39,24 @@ HeldQueue::HeldQueue(std::string path, const QueueRouter::Options& options)
       outbox_(static_cast<size_t>(std::min<uint64_t>(options.held_max, SIZE_MAX))) {}
 
 void HeldQueue::NoteAge() {
-  if (oldest_ == 0 && outbox_.Size() > 0) oldest_ = Clock::Get().Now();
+  if (oldest_ == 0 && Waiting() > 0) oldest_ = Clock::Get().Now();
+}
+
+void HeldQueue::NoteFile(uint64_t file, const std::string& watched) {
+  if (files_.size() < kFilesMax || files_.count(file) != 0) {
+    files_.insert(file);
+    files_folder_ = watched;
+  } else {
+    outbox_.Add(fileindex::EVENT_REINDEX, {watched, true, watched == "/" ? 0 : watched.size()},
+                fileindex::EVENT_REINDEX);
+  }
+  NoteAge();
 }
 
 HeldQueue::TimePoint HeldQueue::Flush(TimePoint now) {
-  if (outbox_.Size() == 0) return TimePoint::max();
+  if (Waiting() == 0) return TimePoint::max();
   if (now >= next_attempt_) Hold(Append(), now);
-  return outbox_.Size() == 0 ? TimePoint::max() : next_attempt_;
+  return Waiting() == 0 ? TimePoint::max() : next_attempt_;
 }
 
 std::string HeldQueue::FlushAll(TimePoint now) {
@@ -73,7 +88,7 @@ void HeldQueue::Hold(std::string reason, TimePoint now) {
 
 /// @return "", or why not everything could be appended.
 std::string HeldQueue::Append() {
-  if (outbox_.Size() == 0) return {};
+  if (Waiting() == 0) return {};
   struct stat status = {};
   if (lstat(path_.c_str(), &status) == 0 && static_cast<uint64_t>(status.st_size) >= bytes_max_) {
     return "it has grown to " + std::to_string(status.st_size >> 20) + " MiB and nobody empties it";
@@ -99,15 +114,26 @@ std::string HeldQueue::AppendLocked() {
   }
   outbox_.RemoveFirst(done);
   written_ += done;
-  if (outbox_.Size() == 0) oldest_ = 0;
+  if (reason.empty()) reason = AppendFiles();
+  if (Waiting() == 0) oldest_ = 0;
   return reason;
+}
+
+std::string HeldQueue::AppendFiles() {
+  if (files_.empty()) return {};
+  std::string text;
+  AppendFilesLine(text, files_folder_, files_);
+  if (!AppendLines(path_, text)) return "it cannot be written: " + ErrnoText();
+  files_.clear();
+  ++written_;
+  return {};
 }
 
 QueueFigures HeldQueue::Figures() const {
   QueueFigures figures;
   figures.written = written_;
   if (reason_.empty()) return figures;
-  figures.held = outbox_.Size();
+  figures.held = Waiting();
   figures.held_since = oldest_;
   figures.held_reason = reason_;
   return figures;

@@ -2,6 +2,7 @@
 
 #include <chrono>
 #include <cstdint>
+#include <set>
 #include <string>
 
 #include "services/kovanotifyd/queues/queue_outbox.h"
@@ -27,19 +28,27 @@ class HeldQueue {
   /// the queue is detached. @return "", or why that failed.
   std::string FlushAll(TimePoint now);
 
+  /// A file of that number changed under a name that the queue has nothing of. Of very many, `watched`, a folder of the
+  /// queue, is compared instead.
+  void NoteFile(uint64_t file, const std::string& watched);
+
   QueueFigures Figures() const;
   /// To be called after lines were put into the outbox.
   void NoteAge();
 
  private:
+  size_t Waiting() const { return outbox_.Size() + (files_.empty() ? 0 : 1); }
   std::string Append();
   std::string AppendLocked();
+  std::string AppendFiles();
   void Hold(std::string reason, TimePoint now);
 
   std::string path_;
   uint64_t bytes_max_;
   QueueOutbox outbox_;
-  int64_t oldest_ = 0;  // when the oldest of what waits came, seconds since the epoch
+  std::set<uint64_t> files_ = {};  // to be told by their numbers, in one line,
+  std::string files_folder_ = {};  // of this watched folder
+  int64_t oldest_ = 0;             // when the oldest of what waits came, seconds since the epoch
   uint64_t written_ = 0;
   std::string reason_;  // why the last attempt failed; "" when it did not
   std::chrono::milliseconds pause_{0};

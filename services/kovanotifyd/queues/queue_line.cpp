@@ -44,4 +44,14 @@ void AppendQueueLine(std::string& text, uint32_t event, bool is_folder, std::str
   text += "\",\"data\":null}\n";
 }
 
+void AppendFilesLine(std::string& text, std::string_view folder, const std::set<uint64_t>& files) {
+  AppendQueueLine(text, 0, true, folder, "");
+  constexpr std::string_view kEnd = "null}\n";
+  text.resize(text.size() - kEnd.size());
+  text += "{\"files\":[";
+  for (const uint64_t file : files) text += std::to_string(file) + ",";
+  text.back() = ']';
+  text += "}}\n";
+}
+
 }  // namespace ferrox::notifyd

@@ -24,6 +24,8 @@ namespace {
 
 /// Files that may be open with unreported writes at the same time.
 constexpr size_t kOpenFilesMax = 10000;
+/// What is written to all the time under a name elsewhere wakes every queue on its file system: so much more rarely.
+constexpr int kLongestByNumber = 6;
 
 /// Such a path cannot be opened and is not indexed, but folders may be nested as deep as anybody likes.
 bool IsTooLong(const std::string& path) { return path.size() >= PATH_MAX; }
@@ -36,7 +38,9 @@ std::string DeepestFolder(const std::string& path) { return path.substr(0, path.
 class QueueRouter::Impl {
  public:
   explicit Impl(const Options& options)
-      : options_(options), open_files_(options.quiet, options.longest, kOpenFilesMax) {}
+      : options_(options),
+        open_files_(options.quiet, options.longest, kOpenFilesMax),
+        by_number_(options.quiet, kLongestByNumber * options.longest, kOpenFilesMax) {}
 
   void SetQueues(const std::map<std::string, std::vector<QueueWatch>>& queues);
   void Put(const Change& change, TimePoint now);
@@ -56,12 +60,14 @@ class QueueRouter::Impl {
   void Compare(size_t queue, const std::string& path, size_t root_size);
   bool IsToldAnyway(const std::string& path);
   OpenFiles::Report ReportWritten();
+  OpenFiles::Report ReportByNumber();
 
   Options options_;
   WatchRules rules_;
   std::map<std::string, std::unique_ptr<HeldQueue>> by_path_;
   std::vector<HeldQueue*> queues_;  // by_path_'s in order, as rules_ counts them
   OpenFiles open_files_;
+  OpenFiles by_number_;  // a file's number, and a root, in place of a path
 };
 
 void QueueRouter::Impl::SetQueues(const std::map<std::string, std::vector<QueueWatch>>& queues) {
@@ -94,6 +100,8 @@ void QueueRouter::Impl::Put(const Change& change, TimePoint now) {
     case Change::Kind::kRenamed:
       open_files_.Move(change.old_path, change.path, change.is_folder);
       return Rename(change);
+    case Change::Kind::kByNumber:
+      return by_number_.Add(std::to_string(change.file) + change.path, now, ReportByNumber());
     case Change::Kind::kUncertain:
       return PutComparison(change.path);
   }
@@ -124,6 +132,19 @@ bool QueueRouter::Impl::IsToldAnyway(const std::string& path) {
 
 OpenFiles::Report QueueRouter::Impl::ReportWritten() {
   return [this](const std::string& path) { Tell(EVENT_MODIFY, path, false); };
+}
+
+/// Each queue that watches the root, or something below it, may have the file.
+OpenFiles::Report QueueRouter::Impl::ReportByNumber() {
+  return [this](const std::string& number_and_root) {
+    const size_t root_at = number_and_root.find('/');
+    const uint64_t file = std::stoull(number_and_root.substr(0, root_at));
+    const std::string root = number_and_root.substr(root_at);
+    for (const Match& match : rules_.MatchesOf(root)) {
+      queues_[match.queue]->NoteFile(file, match.root_size == 0 ? "/" : root.substr(0, match.root_size));
+    }
+    rules_.VisitBelow(root, [&](size_t queue, const std::string& watched) { queues_[queue]->NoteFile(file, watched); });
+  };
 }
 
 void QueueRouter::Impl::Tell(uint32_t event, const std::string& path, bool is_folder) {
@@ -178,13 +199,15 @@ void QueueRouter::Impl::PutComparison(const std::string& path) {
 
 QueueRouter::TimePoint QueueRouter::Impl::Flush(TimePoint now) {
   open_files_.ReportDue(now, ReportWritten());
-  TimePoint next = open_files_.NextDue();
+  by_number_.ReportDue(now, ReportByNumber());
+  TimePoint next = std::min(open_files_.NextDue(), by_number_.NextDue());
   for (HeldQueue* queue : queues_) next = std::min(next, queue->Flush(now));
   return next;
 }
 
 std::string QueueRouter::Impl::FlushAll(TimePoint now) {
   open_files_.ReportAll(ReportWritten());
+  by_number_.ReportAll(ReportByNumber());
   std::string failures;
   for (HeldQueue* queue : queues_) {
     const std::string reason = queue->FlushAll(now);

@@ -1,0 +1,57 @@
+#include "services/kovanotifyd/filesystem/linked_files.h"
+
+#include <fcntl.h>
+
+#include <cerrno>
+#include <string>
+#include <utility>
+
+#include "services/kovanotifyd/filesystem/mounted_folders.h"
+
+namespace ferrox::notifyd {
+
+void LinkedFiles::OnLinks(const HandleKey& file) {
+  alone_.erase(file);
+  if (linked_.size() >= kFilesMax) {
+    linked_.clear();
+    has_forgotten_ = true;
+  }
+  linked_.insert(file);
+}
+
+std::optional<uint64_t> LinkedFiles::NumberToTell(const FanRecord& record) {
+  if (record.target.empty() || alone_.count(record.target) != 0) return 0;
+  const bool is_new = (record.mask & FAN_CREATE) != 0 && !has_forgotten_ && linked_.count(record.target) == 0;
+  if (!is_new) return LookAt(record);
+  NoteAlone(record.target);
+  return 0;
+}
+
+std::optional<uint64_t> LinkedFiles::LookAt(const FanRecord& record) {
+  const UniqueFd file = mounts_.Open(record.target, O_PATH | O_NOFOLLOW);
+  struct stat status = {};
+  if (!file.Valid() && (errno == ESTALE || errno == ENOENT)) return 0;
+  if (!file.Valid() || fstat(file.Get(), &status) != 0) return {};
+  if (!S_ISREG(status.st_mode) || status.st_nlink == 0) return 0;
+  if (status.st_nlink > 1 || mounts_.NumberOf(record.folder, record.name) != status.st_ino) return status.st_ino;
+  NoteAlone(record.target);
+  return 0;
+}
+
+void LinkedFiles::NoteAlone(const HandleKey& file) {
+  if (alone_.size() >= kFilesMax) alone_.clear();
+  alone_.insert(file);
+}
+
+void LinkedFiles::Rest() {
+  linked_.clear();
+  has_forgotten_ = false;
+}
+
+void LinkedFiles::Clear() {
+  alone_.clear();
+  linked_.clear();
+  has_forgotten_ = true;
+}
+
+}  // namespace ferrox::notifyd
