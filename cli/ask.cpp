@@ -4,6 +4,7 @@
 #include <future>
 
 #include "cli/command.h"
+#include "cli/rights.h"
 #include "common/error.h"
 #include "common/file_util.h"
 #include "common/json_util.h"
@@ -47,6 +48,7 @@ Json::Value DataOf(const Daemon& daemon, const std::string& text) {
   std::string message = "the request failed";
   GetJsonValue(code, reply["error"], "code", false);
   GetJsonValue(message, reply["error"], "msg", false);
+  if (code == Error::kEngineNotPermitted) throw MayNot("use", InstancePath(daemon.socket));
   throw Refusal(daemon.name, code, message);
 }
 
@@ -61,6 +63,7 @@ Json::Value Answer(const Daemon& daemon, RequestResult result, const std::string
     throw Failure(std::string(daemon.name) + " does not run here (nothing answers at " + InstancePath(daemon.socket) +
                   "); start it with 'fileindexctl up'" + code);
   }
+  if (result == RequestResult::kNotPermitted) throw MayNot("use", InstancePath(daemon.socket));
   if (result == RequestResult::kNoAnswer) throw Failure(std::string(daemon.name) + " " + kNoAnswer + code);
   return DataOf(daemon, reply);
 }
@@ -91,7 +94,9 @@ Json::Value AskEngine(const std::string& command, const Json::Value& data, std::
 DaemonState StateFrom(const Daemon& daemon, RequestResult result, const std::string& reply) try {
   if (result == RequestResult::kNotRunning) return {};
   if (result == RequestResult::kNoAnswer) return {Json::Value(), kNoAnswer};
-  return {DataOf(daemon, reply), ""};
+  return {Answer(daemon, result, reply), ""};
+} catch (const NotPermitted&) {
+  throw;
 } catch (const Failure& failure) {
   return {Json::Value(), failure.what()};
 }

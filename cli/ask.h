@@ -30,6 +30,7 @@ struct InstanceState {
   DaemonState content_extraction;
 };
 /// Asks all daemons at once and waits for each at most 5 s, so that one that hangs hides nothing of the others.
+/// @throws NotPermitted.
 InstanceState AskAll();
 
 /// Waits until what was changed before in the shares (none named: in all that are worked on) is in the index. @return

@@ -8,7 +8,7 @@
 namespace ferrox::cli {
 
 /// kIncomplete: something that was asked for was left out, or may not be up to date.
-enum ExitCode { kDone = 0, kNothingFound = 1, kWrongUsage = 2, kFailure = 3, kIncomplete = 4 };
+enum ExitCode { kDone = 0, kNothingFound = 1, kWrongUsage = 2, kFailure = 3, kIncomplete = 4, kNotPermitted = 5 };
 
 /// The command line cannot be understood: exit code 2.
 class UsageError : public std::runtime_error {
@@ -33,6 +33,21 @@ class Refusal : public Failure {
  private:
   int code_;
   std::string reason_;
+};
+
+/// The calling user may not do it; the sentence says what, and what to do: exit code 5.
+class NotPermitted : public Failure {
+ public:
+  using Failure::Failure;
+};
+
+/// What a command needs of the instance; each also what stands before it.
+enum class Needs {
+  kNothing,
+  kReading,   ///< to read its settings
+  kService,   ///< to steer the daemons, which only the instance's owner and root may
+  kInstance,  ///< its folders, which are made when they are missing
+  kShares,    ///< the table of shares
 };
 
 /// An option of a command, such as "--limit N".
@@ -62,7 +77,7 @@ struct Command {
   std::vector<Option> options;
   const char* help;
   int (*run)(const Arguments& arguments);
-  bool changes = false;  ///< what it does needs the instance's folders
+  Needs needs = Needs::kReading;
 };
 
 /// Sorts a command's words and options, and checks how many words there are and the options of which the table lists

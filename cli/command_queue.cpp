@@ -1,12 +1,14 @@
+#include <fcntl.h>
 #include <sys/stat.h>
+#include <unistd.h>
 
 #include <cerrno>
 #include <cstdio>
-#include <cstring>
 #include <sstream>
 
 #include "cli/command_table.h"
 #include "cli/escape.h"
+#include "cli/rights.h"
 #include "fileindex/optree.h"
 
 namespace ferrox::cli {
@@ -18,8 +20,10 @@ using OpPtr = std::shared_ptr<fileindex::OP>;
 void CheckReadable(const std::string& path) {
   struct stat status = {};
   const bool there = stat(path.c_str(), &status) == 0;
-  if (there && S_ISREG(status.st_mode)) return;
-  throw Failure(path + ": " + (there ? "not a file" : strerror(errno)) + "; give the path of a share's queue file");
+  constexpr char kRemedy[] = "; give the path of a share's queue file";
+  if (!there) ThrowSystemFailure(errno, "read", path, kRemedy);
+  if (!S_ISREG(status.st_mode)) throw Failure(path + " is not a file" + kRemedy);
+  if (faccessat(AT_FDCWD, path.c_str(), R_OK, AT_EACCESS) != 0) ThrowSystemFailure(errno, "read", path);
 }
 
 void PrintText(const OpPtr& op) {

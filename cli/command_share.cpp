@@ -1,4 +1,5 @@
 #include <algorithm>
+#include <cerrno>
 #include <cstdio>
 
 #include "cli/ask.h"
@@ -6,6 +7,7 @@
 #include "cli/configuration_change.h"
 #include "cli/escape.h"
 #include "cli/own_share.h"
+#include "cli/rights.h"
 #include "cli/share_remains.h"
 #include "common/error.h"
 #include "common/file_util.h"
@@ -20,7 +22,8 @@ namespace {
 /// The folder without links, "." and "..", which is what a share's folder must be.
 std::string RealFolder(const std::string& folder) {
   const std::string real = RealPath(folder);
-  if (real.empty()) throw Failure(folder + ": no such folder; make it first");
+  if (real.empty() && errno == ENOENT) throw Failure(folder + ": no such folder; make it first");
+  if (real.empty()) ThrowSystemFailure(errno, "look at", folder);
   if (!IsDirExist(real, false)) throw Failure(folder + " is no folder; a share must be one");
   return real;
 }

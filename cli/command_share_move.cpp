@@ -1,4 +1,5 @@
 #include <algorithm>
+#include <cerrno>
 #include <cstdio>
 #include <functional>
 
@@ -12,6 +13,7 @@
 #include "cli/folder_path.h"
 #include "cli/format.h"
 #include "cli/own_share.h"
+#include "cli/rights.h"
 #include "cli/share_remains.h"
 #include "common/clock.h"
 #include "common/error.h"
@@ -79,8 +81,7 @@ bool RenameFolder(const std::string& from, const std::string& to) {
   if (!old_there && !new_there) throw Failure(from + " is not there; bring it back first");
   if (new_there) return false;
   if (rename(from.c_str(), to.c_str()) != 0) {
-    throw Failure("cannot rename " + from + " to " + to + ": " + ErrnoText() +
-                  "; rename it yourself, then run this command again");
+    ThrowSystemFailure(errno, "rename", from, "; rename it yourself to " + to + ", then run this command again");
   }
   (void)SyncFolder(Dirname(to));
   return true;

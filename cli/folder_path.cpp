@@ -3,10 +3,12 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <cerrno>
 #include <vector>
 
 #include "cli/command.h"
 #include "cli/own_share.h"
+#include "cli/rights.h"
 #include "common/error.h"
 #include "common/file_util.h"
 #include "fileindex/folder_mgr.h"
@@ -54,6 +56,7 @@ std::string OnDisk(const std::string& text) {
   if (!real.empty() && real != path && !SharePathOnDisk(real).empty()) {
     throw Failure(text + " is, without links, " + real + "; give that path");
   }
+  if (real.empty()) (void)Exists(path);
   throw Failure(text +
                 (real.empty() ? " is neither in a share nor on the disk"
                               : " lies in no share; 'fileindexctl share add' makes it one") +
@@ -64,7 +67,9 @@ std::string OnDisk(const std::string& text) {
 
 bool Exists(const std::string& path) {
   struct stat status = {};
-  return lstat(path.c_str(), &status) == 0;
+  if (lstat(path.c_str(), &status) == 0) return true;
+  if (errno != ENOENT && errno != ENOTDIR) ThrowSystemFailure(errno, "look at", path);
+  return false;
 }
 
 std::string CleanPath(const std::string& absolute, bool parents) {

@@ -1,3 +1,4 @@
+#include <cerrno>
 #include <clocale>
 #include <cstdio>
 
@@ -6,8 +7,8 @@
 #include "cli/escape.h"
 #include "cli/explain.h"
 #include "cli/global_options.h"
+#include "cli/rights.h"
 #include "common/error.h"
-#include "common/log.h"
 #include "common/paths.h"
 #include "services/support/daemon.h"
 
@@ -36,7 +37,8 @@ std::string Overview() {
          "  --root DIR   the instance's folder (default: the environment variable FERROX_ROOT, else the host's own)\n"
          "  --version    the version\n"
          "  --help       this text, or after a command that command's help\n"
-         "Exit codes: 0 done, 1 nothing found, 2 wrong usage, 3 failure, 4 not known to be fresh.\n";
+         "Exit codes: 0 done, 1 nothing found, 2 wrong usage, 3 failure, 4 something was left out,\n"
+         "5 not permitted to this user.\n";
 }
 
 /// Takes the options that stand before the command. True when one of them has done all there was to do.
@@ -49,13 +51,14 @@ bool TakeGlobalOptions(std::vector<std::string>& words) {
 }
 
 /// An instance of its own begins as an empty folder; the host's own has its folders from its package.
-void PrepareInstance(bool changes) {
+void PrepareInstance(Needs needs) {
   const std::string problem = ferrox::InstanceRootProblem();
   if (!problem.empty()) throw Failure(problem);
-  if (!changes || ferrox::InstancePath("").empty()) return;
+  RequireRights(needs);
+  if (needs < Needs::kInstance || ferrox::InstancePath("").empty()) return;
   for (const char* folder : {"/tmp", "/var/run", ferrox::kConfigurationFolder}) {
     const std::string path = ferrox::InstancePath(folder);
-    if (!ferrox::services::MakeFolders(path)) throw Failure("cannot make " + path + ": " + ferrox::ErrnoText());
+    if (!ferrox::services::MakeFolders(path)) ThrowSystemFailure(errno, "make", path);
   }
 }
 
@@ -80,7 +83,7 @@ int Run(std::vector<std::string> words) {
       (void)fputs(HelpFor(*command).c_str(), stdout);
       return kDone;
     }
-    PrepareInstance(command->changes);
+    PrepareInstance(command->needs);
     return command->run(arguments);
   } catch (const UsageError& error) {
     throw UsageError(std::string(error.what()) + "\nUsage: " + UsageLine(*command));
@@ -98,8 +101,12 @@ int main(int argc, char** argv) {
   } catch (const UsageError& error) {
     (void)fprintf(stderr, "fileindexctl: %s\nTry 'fileindexctl --help'.\n", EscapeText(error.what()).c_str());
     return kWrongUsage;
+  } catch (const NotPermitted& error) {
+    (void)fprintf(stderr, "fileindexctl: %s\n", EscapeForTerminal(error.what()).c_str());
+    return kNotPermitted;
   } catch (const ferrox::Error& error) {
     (void)fprintf(stderr, "fileindexctl: %s\n", EscapeForTerminal(Explain(error)).c_str());
+    if (error.Code() == ferrox::Error::kCredentialsFailed) return kNotPermitted;
   } catch (const std::exception& error) {
     (void)fprintf(stderr, "fileindexctl: %s\n", EscapeForTerminal(error.what()).c_str());
   }

@@ -24,12 +24,18 @@ class Connection : public kovadaemon::DomainSockConnection {
   }
 };
 
+/// Only a socket that is missing or that nobody serves is that of a daemon that does not run.
+RequestResult WhyNotConnected(int error) {
+  if (error == ENOENT || error == ENOTDIR || error == ECONNREFUSED) return RequestResult::kNotRunning;
+  return error == EACCES || error == EPERM ? RequestResult::kNotPermitted : RequestResult::kNoAnswer;
+}
+
 }  // namespace
 
 RequestResult AskLocally(const std::string& socket_path, const std::string& request, std::chrono::milliseconds longest,
                          std::string& reply) {
   Connection connection(socket_path);
-  if (!connection.Connect()) return RequestResult::kNotRunning;
+  if (!connection.Connect()) return WhyNotConnected(errno);
   const bool answered = connection.Send(request) && connection.WaitForReply(longest) && connection.Recv(reply);
   return answered ? RequestResult::kAnswered : RequestResult::kNoAnswer;
 }

@@ -5,7 +5,7 @@
 
 namespace ferrox::services {
 
-enum class RequestResult { kAnswered, kNotRunning, kNoAnswer };
+enum class RequestResult { kAnswered, kNotRunning, kNotPermitted, kNoAnswer };
 
 /// Sends one request to a daemon of this instance and waits for the beginning of its reply, at most `longest`; without
 /// retries. `reply` is filled when it was answered.

@@ -332,6 +332,37 @@ class ToolTest(unittest.TestCase):
                 for option in self.complete(*command, "--"):
                     self.assertIn(option, place.group(2) + " --help", "not in the manual")
 
+    @unittest.skipUnless(os.geteuid() == 0, "root's service is refused to others; needs root")
+    def test_other_users_are_told_what_is_not_permitted(self):
+        def contents():
+            return sorted((folder, names, [os.stat(f"{folder}/{name}").st_mtime_ns for name in names])
+                          for folder, _, names in os.walk(self.root))
+
+        def run(*words):
+            return subprocess.run([TOOL, *words], env=self.env, cwd="/", capture_output=True, timeout=60, check=False,
+                                  user=65534, group=65534, extra_groups=[])
+
+        queue, words = f"{self.root}/queue", {"SHARE": "photo", "PATH": "/photo/trip", "NEW_NAME": "new"}
+        write_json(queue, {})
+        os.chmod(queue, 0o600)
+        for name in ("kovaelasticd", "kovanotifyd", "fileindexd", "kovacontentextractd"):
+            os.chmod(self.daemon(name).path, 0o600)
+        before = contents()
+        for mode, readers in ((0o755, ["share list", "folder list", "folder get"]), (0o700, [])):
+            os.chmod(self.root, mode)
+            for command in map(" ".join, self.commands()):
+                usage = self.run_tool(*command.split(), "--help").stdout.decode().splitlines()[0].split(command, 1)[1]
+                named = re.findall(r"(?<!\S)[A-Z]\w+", re.sub(r"\[--\w.*?\]+ ?", "", usage))
+                given = ["/photo/trip"] if command == "show" else [words.get(word, queue) for word in named]
+                done = run(*command.split(), *given)
+                with self.subTest(command=command, given=given, mode=mode):
+                    self.assertEqual(0 if command in readers else 5, done.returncode, done.stderr)
+                    if done.returncode:
+                        self.assertRegex(done.stderr.decode(), rf"^fileindexctl: user \w+ may not \w+ {self.root}\S*, which "
+                                         rf"belongs to root; run 'sudo fileindexctl --root {self.root}' .*'--root'")
+        self.assertEqual(5, run("search", "--fresh", "x").returncode)
+        self.assertEqual(before, contents())
+
     def test_completion_knows_commands_shares_folders_and_kinds(self):
         rows = [
             (["fol"], ["folder"]), (["--root", self.root, "share", "ren"], ["rename"]), (["folder", "r"], ["reindex"]),

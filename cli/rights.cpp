@@ -1,0 +1,84 @@
+#include "cli/rights.h"
+
+#include <fcntl.h>
+#include <pwd.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstring>
+
+#include <kova/instance.h>
+
+#include "common/file_util.h"
+#include "common/paths.h"
+#include "platform/host/share_table.h"
+
+namespace ferrox::cli {
+
+namespace {
+
+bool IsDenial(int error) { return error == EACCES || error == EPERM; }
+
+/// Whether the caller is denied the access; no when there is nothing to access, or another reason against it.
+bool IsDenied(const std::string& path, int mode) {
+  return faccessat(AT_FDCWD, path.c_str(), mode, AT_EACCESS) != 0 && IsDenial(errno);
+}
+
+std::string UserName(uid_t uid) {
+  const passwd* user = getpwuid(uid);
+  return user != nullptr ? user->pw_name : std::to_string(uid);
+}
+
+/// Of the path, or of the deepest folder above it that can be told.
+uid_t OwnerOf(std::string path) {
+  struct stat status = {};
+  while (stat(path.c_str(), &status) != 0 && path.size() > 1) {
+    path = Dirname(path);
+    if (path.empty()) path = "/";
+  }
+  return status.st_uid;
+}
+
+/// The folder itself, or the deepest one above it that is there: where it would be made.
+std::string PlaceOf(std::string folder) {
+  struct stat status = {};
+  while (folder.size() > 1 && stat(folder.c_str(), &status) != 0 && errno == ENOENT) {
+    folder = Dirname(folder);
+    if (folder.empty()) folder = "/";
+  }
+  return folder;
+}
+
+}  // namespace
+
+NotPermitted MayNot(const std::string& act, const std::string& path) {
+  const std::string owner = UserName(OwnerOf(path));
+  const std::string& root = kova::InstanceRoot();
+  const std::string command = std::string("sudo") + (owner == "root" ? "" : " -u " + owner) + " fileindexctl" +
+                              (root.empty() ? "" : " --root " + root);  // sudo drops FERROX_ROOT
+  return NotPermitted("user " + UserName(geteuid()) + " may not " + act + " " + path + ", which belongs to " + owner +
+                      "; run '" + command +
+                      "' with the same command, or work on an instance of your own ('--root' with a folder that you "
+                      "may write)");
+}
+
+void RequireRights(Needs needs) {
+  if (needs >= Needs::kReading) {
+    for (const std::string& file : {kova::host::ShareTablePath(), kova::InstanceRoot() + "/etc/kova/kova.json",
+                                    InstancePath(kFileIndexFoldersCfgPath), InstancePath(kFileIndexStatusCfgPath)}) {
+      if (IsDenied(file, R_OK)) throw MayNot("read", file);
+    }
+  }
+  if (needs >= Needs::kService) {
+    const std::string folder = PlaceOf(InstancePath(kConfigurationFolder));
+    if (IsDenied(folder, W_OK | X_OK)) throw MayNot("change", folder);
+  }
+}
+
+void ThrowSystemFailure(int error, const std::string& act, const std::string& path, const std::string& remedy) {
+  if (IsDenial(error)) throw MayNot(act, path);
+  throw Failure("cannot " + act + " " + path + ": " + strerror(error) + remedy);
+}
+
+}  // namespace ferrox::cli

@@ -1,0 +1,22 @@
+#pragma once
+
+#include <string>
+
+#include "cli/command.h"
+
+/// What the calling user may do in this instance. Asked before a command begins, so that what is not permitted is not
+/// taken for what is not there, and nothing is left half done.
+namespace ferrox::cli {
+
+/// "user <name> may not <do> <path>, which belongs to <owner>; <the remedy>". `path` need not be reachable.
+NotPermitted MayNot(const std::string& act, const std::string& path);
+
+/// @throws NotPermitted for a command that may not be run; Failure when something else keeps the instance from being
+/// used.
+void RequireRights(Needs needs);
+
+/// MayNot for an errno value that says so, else Failure: "cannot <act> <path>: <the system's reason><remedy>".
+[[noreturn]] void ThrowSystemFailure(int error, const std::string& act, const std::string& path,
+                                     const std::string& remedy = "");
+
+}  // namespace ferrox::cli
