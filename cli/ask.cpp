@@ -196,6 +196,11 @@ void RequireEngine() { (void)AskEngine("ping", Json::Value(Json::objectValue), k
 
 void RequireIndexDaemon() { (void)AskIndexDaemon("status", Json::Value()); }
 
+void RequireDaemons() {
+  RequireEngine();
+  RequireIndexDaemon();
+}
+
 Json::Value ShareName(const std::string& name) {
   Json::Value data;
   data["share_name"] = name;

@@ -42,6 +42,7 @@ std::map<std::string, std::string> AwaitChanges(const std::vector<std::string>& 
 /// @throws Failure when it does not run or does not answer.
 void RequireEngine();
 void RequireIndexDaemon();
+void RequireDaemons();  ///< both
 
 /// Has the index daemon, if it runs, look again at what it is to do for a share.
 void NotifySettingChanged(const std::string& share);

@@ -118,7 +118,11 @@ int RunFolderDelete(const Arguments& arguments) {
 int RunFolderReindex(const Arguments& arguments) {
   const FolderMgr configured;
   const std::vector<std::string> paths = SharePaths(arguments, configured);
-  for (const std::string& path : paths) RequireIndexed(fileindex::GetShareNameByPath(path), configured);
+  for (const std::string& path : paths) {
+    RequireIndexed(fileindex::GetShareNameByPath(path), configured);
+    if (configured.IsFullPathIndexed(fileindex::GetFullPath(path))) continue;
+    throw Failure(path + " lies in no indexed folder; 'fileindexctl folder list' shows them");
+  }
   fileindex::FolderReindex(ToArray(paths));
   for (const std::string& path : paths) (void)MarkIfBusy(fileindex::GetShareNameByPath(path));
   for (const std::string& path : paths) {

@@ -127,6 +127,10 @@ int RunIndex(const Arguments& arguments) {
 
 int RunSuggestRefresh(const Arguments& arguments) {
   const std::vector<std::string> shares = IndexedShares(arguments.words);
+  if (shares.empty()) {
+    (void)fprintf(stderr, "no folder is indexed: there is nothing to suggest\n");
+    return kNothingFound;
+  }
   RequireEngine();
   size_t done = 0;
   LeftOut left_out;

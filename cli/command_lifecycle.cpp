@@ -1,7 +1,8 @@
 #include <cstdio>
-#include <set>
+#include <functional>
 
 #include <kova/recycle.h>
+#include <kova/string_list.h>
 
 #include "cli/ask.h"
 #include "cli/command_table.h"
@@ -21,37 +22,41 @@ namespace {
 
 using fileindex::FolderMgr;
 
-/// Carries an operation out and tells what has become of which folders.
-int ChangeAndReport(const std::function<void()>& change, const std::string& nothing) {
-  const FolderMgr before;
-  ChangeConfiguration(change);
-  const FolderMgr after;
-  bool changed = false;
-  for (const auto& folder : before.GetFolders()) {
-    const std::string path = EscapeForTerminal(folder->GetPath());
-    std::shared_ptr<fileindex::Folder> now;
-    if (after.HasFolder(folder->GetPath())) after.Get(now, folder->GetPath());
-    if (now != nullptr && now->IsPaused() == folder->IsPaused()) continue;
-    changed = true;
-    (void)printf("%s: %s\n", path.c_str(), now == nullptr ? "forgotten" : now->IsPaused() ? "paused" : "goes on");
-  }
-  if (!changed) (void)printf("%s\n", EscapeForTerminal(nothing).c_str());
-  return kDone;
-}
-
-void RequireDaemons() {
-  RequireEngine();
-  RequireIndexDaemon();
-}
+constexpr char kHomes[] = "homes";
 
 AUTH_TYPE Accounts(const Arguments& arguments) {
   const std::string accounts = arguments.Get("--accounts", "local");
   return accounts == "domain" ? AUTH_DOMAIN : accounts == "ldap" ? AUTH_LDAP : AUTH_LOCAL;
 }
 
-int ReportHomes() {
-  (void)printf("the recycle bins of the homes are compared with the index again\n");
+/// Tells the library of the homes' recycle bins, where there is one that is indexed.
+int CompareHomes(const std::function<void()>& tell, const std::function<int(KLIBCSzList**)>& enumerate) {
+  KLIBCSzList* list = KLIBCSzListAlloc(1024);
+  const int bins = enumerate(&list);
+  KLIBCSzListFree(list);
+  if (bins < 0) throw Failure("the users' home folders cannot be read; see that the folder of share homes is there");
+  const bool indexed = FolderMgr().IsShareIndexed(kHomes);
+  if (bins > 0 && indexed) tell();
+  if (!indexed) {
+    (void)printf("nothing is compared: no folder of share %s is indexed\n", kHomes);
+  } else if (bins == 0) {
+    (void)printf("nothing is compared: no home has a recycle bin\n");
+  } else {
+    (void)printf("the recycle bins of the homes are compared with the index again: %d\n", bins);
+  }
   return kDone;
+}
+
+/// A user's folder has its new name when the user's rename is told.
+void RequireRenamed(const std::string& old_name, const std::string& new_name) {
+  const std::string homes = sdk::SDKShare(kHomes).GetPath() + "/";
+  RequireIndexed(kHomes, FolderMgr());
+  if (Exists(homes + old_name)) {
+    throw Failure(homes + old_name + " is still there; rename it to " + homes + new_name + " first");
+  }
+  if (!Exists(homes + new_name)) {
+    throw Failure("there is neither " + homes + old_name + " nor " + homes + new_name + "; check the names");
+  }
 }
 
 /// The index of a share that is indexed at this moment is not dropped by mistake.
@@ -98,54 +103,35 @@ int RunShareForget(const Arguments& arguments) {
 }
 
 int RunShareCheckRecycle(const Arguments& arguments) {
-  fileindex::ShareCheckRecycle(arguments.words[0]);
-  (void)printf("the recycle bin of share %s is compared with the index again\n",
-               EscapeForTerminal(arguments.words[0]).c_str());
+  const std::string name = sdk::SDKShare(arguments.words[0]).GetName();
+  RequireIndexed(name, FolderMgr());
+  fileindex::ShareCheckRecycle(name);
+  (void)printf("the recycle bin of share %s is compared with the index again\n", EscapeForTerminal(name).c_str());
   return kDone;
 }
 
-int RunVolumePause(const Arguments& arguments) {
-  const std::string volume = AbsolutePath(arguments.words[0]);
-  RequireDaemons();
-  return ChangeAndReport([&] { fileindex::VolumePause(volume); },
-                         "no indexed folder that is not paused lies on " + volume);
-}
-
-int RunVolumeResume(const Arguments& arguments) {
-  const std::string volume = AbsolutePath(arguments.words[0]);
-  RequireDaemons();
-  return ChangeAndReport([&] { fileindex::VolumeResume(volume); }, "no paused folder lies on " + volume);
-}
-
-/// The operation itself leaves the indices, as if they had gone with the volume; on this host they lie elsewhere.
-int RunVolumeForget(const Arguments& arguments) {
-  const std::string volume = AbsolutePath(arguments.words[0]);
-  RequireEngine();
-  const std::set<std::string> before = FolderMgr().GetIndexedShares();
-  const int code =
-      ChangeAndReport([&] { fileindex::VolumeClearPaused(volume); }, "no folder was paused with the volume " + volume);
-  const std::set<std::string> after = FolderMgr().GetIndexedShares();
-  for (const std::string& share : before) {
-    if (after.count(share) == 0 && IsShare(share)) DropRemains(share, sdk::SDKShare(share).GetQueuePath());
-  }
-  return code;
-}
-
 int RunHomeEnable(const Arguments& arguments) {
-  fileindex::HomeEnable(Accounts(arguments));
-  return ReportHomes();
+  const AUTH_TYPE accounts = Accounts(arguments);
+  return CompareHomes([&] { fileindex::HomeEnable(accounts); },
+                      [&](KLIBCSzList** list) { return KOVARecycleHomeEnumRecyclePathForAuthType(list, accounts); });
 }
 
 int RunHomeDisable(const Arguments& arguments) {
-  fileindex::HomeDisable(Accounts(arguments));
-  return ReportHomes();
+  return CompareHomes([&] { fileindex::HomeDisable(Accounts(arguments)); }, &KOVARecycleHomeEnumRecyclePath);
 }
 
 int RunUserRename(const Arguments& arguments) {
-  const sdk::SDKShare homes("homes");
-  ChangeConfiguration([&] { fileindex::UserRename(arguments.words[0], arguments.words[1]); });
-  (void)printf("%s/%s: the index follows\n", EscapeForTerminal(homes.GetPath()).c_str(),
-               EscapeForTerminal(arguments.words[1]).c_str());
+  const std::string& old_name = arguments.words[0];
+  const std::string& new_name = arguments.words[1];
+  for (const std::string& name : arguments.words) {
+    if (name.empty() || name.find('/') != std::string::npos || name == "." || name == "..")
+      throw UsageError("\"" + EscapeForTerminal(name) + "\" cannot be a user's name");
+  }
+  if (old_name == new_name) throw UsageError("the new name is the old one");
+  RequireRenamed(old_name, new_name);
+  ChangeConfiguration([&] { fileindex::UserRename(old_name, new_name); });
+  (void)printf("%s/%s: the index follows\n", EscapeForTerminal(sdk::SDKShare(kHomes).GetPath()).c_str(),
+               EscapeForTerminal(new_name).c_str());
   return kDone;
 }
 

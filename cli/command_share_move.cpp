@@ -224,10 +224,14 @@ int RunShareMigrate(const Arguments& arguments) {
     RefuseSharesBelow(OwnShare(name, "move"));
     MoveInTable(name, [&] { kova::host::MoveShare(name, new_path); });
   }
-  Follow(
-      move, [](const Move& moved) { fileindex::ShareMigrate(moved.new_name, moved.old_path, moved.new_path); }, again);
-  (void)printf("share %s is at %s; its index follows\n", EscapeForTerminal(name).c_str(),
-               EscapeForTerminal(new_path).c_str());
+  const bool indexed = fileindex::FolderMgr().IsShareIndexed(name);
+  if (indexed) {
+    Follow(
+        move, [](const Move& moved) { fileindex::ShareMigrate(moved.new_name, moved.old_path, moved.new_path); },
+        again);
+  }
+  (void)printf("share %s is at %s%s\n", EscapeForTerminal(name).c_str(), EscapeForTerminal(new_path).c_str(),
+               indexed ? "; its index follows" : "; no folder of it is indexed");
   return kDone;
 }
 

@@ -1,10 +1,12 @@
 #include "cli/configuration_change.h"
 
 #include <algorithm>
+#include <cstdio>
 #include <cstring>
 #include <set>
 
 #include "cli/command.h"
+#include "cli/escape.h"
 #include "cli/explain.h"
 #include "common/file_util.h"
 #include "common/log.h"
@@ -52,6 +54,23 @@ void ChangeConfiguration(const std::function<void()>& change) {
                   "'fileindexctl index' with the share's name";
     throw Failure(Explain(error, note));
   }
+}
+
+int ChangeAndReport(const std::function<void()>& change, const std::string& nothing) {
+  const fileindex::FolderMgr before;
+  ChangeConfiguration(change);
+  const fileindex::FolderMgr after;
+  bool changed = false;
+  for (const auto& folder : before.GetFolders()) {
+    const std::string path = EscapeForTerminal(folder->GetPath());
+    std::shared_ptr<fileindex::Folder> now;
+    if (after.HasFolder(folder->GetPath())) after.Get(now, folder->GetPath());
+    if (now != nullptr && now->IsPaused() == folder->IsPaused()) continue;
+    changed = true;
+    (void)printf("%s: %s\n", path.c_str(), now == nullptr ? "forgotten" : now->IsPaused() ? "paused" : "goes on");
+  }
+  if (!changed) (void)printf("%s\n", EscapeForTerminal(nothing).c_str());
+  return kDone;
 }
 
 bool IsPaused(const std::string& share) {

@@ -14,6 +14,9 @@ namespace ferrox::cli {
 /// how to finish what follows from it. @throws Failure.
 void ChangeConfiguration(const std::function<void()>& change);
 
+/// Runs one and tells what has become of which folders, or `nothing`. @return the exit code. @throws Failure.
+int ChangeAndReport(const std::function<void()>& change, const std::string& nothing);
+
 /// Whether a folder of the share is paused.
 bool IsPaused(const std::string& share);
 

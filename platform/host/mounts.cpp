@@ -73,4 +73,9 @@ int IsMountRoot(const std::string& path) {
   return self.st_dev != above.st_dev || self.st_ino == above.st_ino ? 1 : 0;
 }
 
+std::string MountPointOf(std::string path) {
+  while (path.size() > 1 && IsMountRoot(path) != 1) path = FolderOf(path);
+  return path;
+}
+
 }  // namespace kova::host

@@ -11,4 +11,7 @@ std::string MountedType(const std::string& path);
 /// 1 when a mount begins at `path`, 0 when not, below 0 with errno. Links are not followed.
 int IsMountRoot(const std::string& path);
 
+/// The deepest mount point at or above a path without links, whether or not the path is there.
+std::string MountPointOf(std::string path);
+
 }  // namespace kova::host

@@ -276,6 +276,20 @@ class ToolTest(unittest.TestCase):
             self.assertEqual([3, 3], [run.returncode for run in runs])
             self.assertIn("the notification daemon does not answer" if len(hung_names) == 1 else "is not known", shown.decode())
 
+    def test_root_volume_is_paused_and_resumed_share_by_share(self):
+        engine = self.daemon("kovaelasticd", **dict.fromkeys(("ping", "index_pause", "index_resume"), success({})))
+        self.daemon("fileindexd", **dict.fromkeys(("status", "worker_delete", "worker_create"), success({})))
+        volume = self.root
+        while not os.path.ismount(volume):
+            volume = os.path.dirname(volume)
+        if volume != "/":
+            self.skipTest("the temporary folder is a volume of its own")
+        for verb, told in (("pause", "paused"), ("resume", "goes on")):
+            done = self.run_tool("volume", verb, "/")
+            self.assertEqual((0, f"/photo/trip: {told}\n/photos/a b: {told}\n"), (done.returncode, done.stdout.decode()))
+        self.assertEqual(["index_pause"] * 2 + ["index_resume"] * 2, [name for name, _ in engine.asked if name != "ping"])
+        self.assertIn(b"no folder was paused with the volume /;", self.run_tool("volume", "forget", "/").stderr)
+
     def test_search_of_a_hung_engine_ends(self):
         daemon = HungDaemon(self.root, "kovaelasticd", {})
         self.addCleanup(daemon.close)

@@ -131,6 +131,14 @@ class Instance:
         except FileNotFoundError:
             return []
 
+    @staticmethod
+    def make_volume(test, folder):
+        """Makes a folder a mount point until the test ends."""
+        done = subprocess.run(["mount", "--bind", folder, folder], capture_output=True, text=True, check=False)
+        if done.returncode != 0:
+            test.skipTest(f"mount: {done.stderr.strip()}")
+        test.addCleanup(subprocess.run, ["umount", "-l", folder], capture_output=True, check=False)
+
     def queue_path(self, folder):
         name = folder.strip("/").replace("/", "+")
         return f"{self.root}/var/lib/kova/fileindex/queue/{name}.queue"

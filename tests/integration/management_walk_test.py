@@ -58,6 +58,7 @@ class ManagementWalkTest(InstanceTestCase):
 
         self.switch_a_kind(docs, roof, films, anna, berta)
         papers = self.rename_and_move(docs)
+        self.instance.make_volume(self, f"{self.vol}2")
         self.pause_and_resume(papers, films)
         self.forget_a_volume(papers)
         self.rename_a_user()
@@ -151,6 +152,8 @@ class ManagementWalkTest(InstanceTestCase):
         self.expect_found("capybara", f"{homes}/carla/notes/diary.txt", f"{homes}/annabel/notes/diary.txt")
         write(f"{homes}/carla/#recycle/old.txt", "capybara in the bin")
         self.instance.queue(homes, event(CREATE, f"{homes}/carla/#recycle/old.txt"))
+        for old, new, text in (("nope", "x", "neither"), ("carla", "anna", "still there")):
+            self.expect_refused(None, "user", "rename", old, new, text=text)
         for words in (["home", "enable"], ["home", "disable", "--accounts", "ldap"], ["share", "check-recycle", "homes"],
                       ["folder", "reindex", "/homes/carla"], ["prepare"]):
             self.ctl(*words)
@@ -217,13 +220,17 @@ class ManagementWalkTest(InstanceTestCase):
             (None, "already", ["share", "migrate", "photo", photo]),
             (None, "", ["share", "migrate", "photo", f"{self.vol}/nowhere"]),
             (800, "homes", ["user", "rename", "a", "b"]),
+            (None, "no indexed folder", ["folder", "reindex", "/photo/other"]),
+            (None, "no folder of share", ["share", "check-recycle", "photos"]),
+            *((None, f"{self.vol} is no mount point; it lies on the volume /", ["volume", verb, self.vol])
+              for verb in ("pause", "resume", "forget")),
+            (None, "is not there", ["volume", "pause", f"{self.vol}/pho"]),
             (800, "share list", ["suggest-refresh", "nonexistent"]),
         ]
         for code, text, words in rows:
             with self.subTest(words=words):
                 self.expect_refused(code, *words, text=text)
         self.assertEqual(["photo"], [share["share"] for share in self.instance.status()["index_daemon"]["shares"]])
-        self.assertIn(b"no indexed folder", self.ctl("volume", "pause", f"{self.vol}/pho"))
         os.mkdir(f"{self.instance.root}/var/packages/Ferrox/etc/fileindex.folders.new")  # stops root's writing, too
         self.expect_refused(505, "folder", "add", "/photo/other", text="not done: save the folders; tell the index daemon")
 
@@ -238,7 +245,7 @@ class ManagementWalkTest(InstanceTestCase):
         self.ctl("folder", "add", "/docs", "/media")
         self.expect_documents("docs", docs, docs)
         self.instance.kill("fileindexd")
-        for words in (["folder", "delete", "/docs"], ["share", "pause", "docs"], ["volume", "pause", self.vol]):
+        for words in (["folder", "delete", "/docs"], ["share", "pause", "docs"], ["volume", "pause", "/"]):
             self.expect_refused(502, *words, text="fileindexctl up")
         write(f"{docs}/a.txt", "ibex")
         self.ctl("folder", "set", "/docs", "--kinds", "none")  # starts the index daemon

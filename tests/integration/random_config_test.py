@@ -6,6 +6,7 @@ import json
 import os
 import random
 import shutil
+import subprocess
 import sys
 import tempfile
 import time
@@ -26,7 +27,7 @@ FIELDS = ["KOVAMDPath", "KOVAMDParent", "KOVAMDFSName", "KOVAMDSearchFileName", 
 class World:
     """Shares on two volumes, and an instance that indexes them; each change is told as a host tells it."""
 
-    def __init__(self, seed):
+    def __init__(self, test, seed):
         self.random, self.number, self.log = random.Random(seed), 0, []
         self.instance = Instance()
         other_device = "/dev/shm" if os.access("/dev/shm", os.W_OK) else None
@@ -34,6 +35,8 @@ class World:
                         os.path.realpath(tempfile.mkdtemp(prefix="fi-vol", dir=other_device))]
         self.shares = {name: f"{self.volumes[0]}/{name}" for name in ("docs", "media", "homes")}
         self.instance.ctl("up")
+        for volume in self.volumes:
+            self.instance.make_volume(test, volume)
         for name, path in self.shares.items():
             for place in ("", "anna", "anna/notes", "anna/notes/old", "bert", "bert/#recycle", "carl/work"):
                 self.fill(f"{path}/{place}".rstrip("/"))
@@ -43,6 +46,7 @@ class World:
     def stop(self):
         self.instance.stop()
         for volume in self.volumes:
+            subprocess.run(["umount", "-l", volume], check=False)
             shutil.rmtree(volume, ignore_errors=True)
 
     def ctl(self, *words):
@@ -180,6 +184,9 @@ class World:
         what, name = self.random.choice([("share", self.random.choice(self.indexed_shares())),
                                          ("volume", self.random.choice(self.volumes))])
         self.ctl(what, "pause", name)
+        if what == "volume" and not any(folder["paused"] and folder["volume_to_be_clean"] == name
+                                           for folder in self.instance.folders()):
+            return
         self.ctl(what, "forget", name)
         if not self.instance.folders():
             self.ctl("folder", "add", "/" + self.some_share())
@@ -189,7 +196,7 @@ class World:
         homes = self.shares["homes"]
         old = self.random.choice([name for name in sorted(os.listdir(homes)) if os.path.isdir(f"{homes}/{name}")] or [""])
         new = f"user{self.next()}"
-        if not old or old.startswith("#"):
+        if not old or old.startswith("#") or "homes" not in self.indexed_shares():
             return
         os.rename(f"{homes}/{old}", f"{homes}/{new}")
         if self.random.random() < 0.5:
@@ -216,7 +223,8 @@ class World:
         with open(path + ".test", "w", encoding="utf-8") as file:
             json.dump(table, file)
         os.rename(path + ".test", path)
-        self.ctl("share", "check-recycle", share)
+        if share in self.indexed_shares():
+            self.ctl("share", "check-recycle", share)
 
     def kill(self):
         program = self.random.choice(["fileindexd", "fileindexd", "kovaelasticd"])
@@ -277,7 +285,7 @@ class RandomConfigTest(unittest.TestCase):
         for seed in SEEDS:
             with self.subTest(seed=seed):
                 print("seed", seed, file=sys.stderr)
-                world = World(seed)
+                world = World(self, seed)
                 try:
                     self.check(world)
                 except Exception:
