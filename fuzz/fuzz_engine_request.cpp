@@ -6,6 +6,7 @@
 #include <json/value.h>
 
 #include "common/json_util.h"
+#include "fuzz/memory_folder.h"
 #include "services/kovaelasticd/engine.h"
 
 namespace {
@@ -13,7 +14,7 @@ namespace {
 /// An engine in a folder of its own, with one index that requests can name.
 class Fixture {
  public:
-  Fixture() : folder_(Folder()), engine_(folder_) {
+  Fixture() : folder_(ferrox::test::MakeMemoryFolder("fuzz_engine")), engine_(folder_) {
     (void)engine_.Handle(R"({"command":"index_create","data":{"id":"a","path":")" + folder_ + "/a\"}}", {});
     (void)engine_.Handle(R"({"command":"document_upsert_by_id","data":{"id":"a","doc_id":"/v/x.txt","data":{}}})", {});
   }
@@ -21,10 +22,6 @@ class Fixture {
   std::string Handle(const std::string& request) { return engine_.Handle(request, {}); }
 
  private:
-  static std::string Folder() {
-    std::string pattern = std::filesystem::temp_directory_path().string() + "/fuzz-engine-XXXXXX";
-    return mkdtemp(pattern.data()) == nullptr ? std::string("/nonexistent") : pattern;
-  }
   std::string folder_;
   ferrox::engine::Engine engine_;
 };

@@ -14,6 +14,7 @@
 #include "common/log.h"
 #include "common/paths.h"
 #include "fileindex/folder_mgr.h"
+#include "fuzz/memory_folder.h"
 #include "tests/support/fake_platform.h"
 
 using ferrox::Error;
@@ -25,8 +26,7 @@ namespace {
 class Instance {
  public:
   Instance() {
-    std::string pattern = std::filesystem::temp_directory_path() / "fuzz_folders-XXXXXX";
-    root_ = mkdtemp(pattern.data());
+    root_ = ferrox::test::MakeMemoryFolder("fuzz_folders");
     (void)setenv("FERROX_ROOT", root_.c_str(), 1);
     std::filesystem::create_directories(ferrox::InstancePath(ferrox::kConfigurationFolder));
     (void)ferrox::SetLogSink([](int, const char*) {});

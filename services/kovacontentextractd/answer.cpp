@@ -70,6 +70,11 @@ std::string Shortest(double number) {
   return {text.data(), end};
 }
 
+/// UTF-8 in the JSON text is not enough: an escape such as \udfff becomes bytes that are none.
+bool IsFieldText(const std::string& text) {
+  return text.size() <= kFieldMaxBytes && ValidUtf8Prefix(text) == text.size();
+}
+
 /// `value` as the index takes it; null when it is not of that type.
 Json::Value OfType(Type type, const Json::Value& value) {
   if (type == Type::kBool) return value.isBool() ? value : Json::Value();
@@ -77,7 +82,7 @@ Json::Value OfType(Type type, const Json::Value& value) {
   if (type == Type::kNumber) return value.isNumeric() ? Json::Value(value.asDouble()) : Json::Value();
   if (value.isDouble() && !value.isInt64()) return Shortest(value.asDouble());
   if (value.isNumeric()) return toString(value);
-  return value.isString() && value.asString().size() <= kFieldMaxBytes ? value : Json::Value();
+  return value.isString() && IsFieldText(value.asString()) ? value : Json::Value();
 }
 
 /// The attachments that are listed, up to the first one that cannot be.

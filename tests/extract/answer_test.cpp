@@ -27,6 +27,8 @@ TEST(AnswerTest, OnlyWhatAFilesContentMaySayIsTaken) {
       {R"({"KOVAMDPath":"/etc","KOVAMDOwnerUserID":"0","KOVAMDIsDir":true,"KOVAMDFSSize":1})", "{}"},
       {R"({"_KOVAStamp":"x","_KOVANeedMeta":false,"_KOVAExtractVersion":9,"bogus":1})", "{}"},
       {R"({"KOVAMDTextContent":"not here"})", "{}"},
+      {R"({"KOVAMDTitle":"\udfff","KOVAMDAlbum":"\u00e4\ud83d\ude00"})",
+       "{\"KOVAMDAlbum\":\"\xc3\xa4\xf0\x9f\x98\x80\"}"},
       {R"({"KOVAMDRecordingYear":"1984","KOVAMDTitle":[1],"KOVAMDAlbum":{"a":1},"KOVAMDComment":null})", "{}"},
       {R"({"KOVAMDRecordingYear":1984,"KOVAMDDurationSecond":3,"KOVAMDPixelWidth":640,"KOVAMDISOSpeed":1.5})",
        R"({"KOVAMDDurationSecond":3.0,"KOVAMDPixelWidth":"640","KOVAMDRecordingYear":1984})"},
