@@ -13,6 +13,7 @@
 #include "fileindex/index_mgr.h"
 #include "fileindex/status_mgr.h"
 #include "platform/host/child_service.h"
+#include "services/support/daemon.h"
 
 namespace ferrox::cli {
 
@@ -56,6 +57,7 @@ int ReportPause(void (*change)(int hours), int hours, const std::string& report)
 }  // namespace
 
 int RunUp(const Arguments&) {
+  services::GuardLockFiles();
   for (const Service& service : kServices) {
     const bool ran = KLIBServiceIsRunning(service.name) == 1;
     if (service.start(service.name, service.option) < 0) ThrowProblem(service, "started");
@@ -76,6 +78,7 @@ int RunDown(const Arguments&) {
 
 /// Goes by the list of indexed folders, and never fails for a service: what runs then is told.
 int RunPrepare(const Arguments&) {
+  services::GuardLockFiles();
   fileindex::PrepareServices();
   if (!fileindex::FolderMgr().GetFolders().empty()) (void)KLIBServiceStart("kovanotifyd", 1);
   for (const Service& service : kServices) {

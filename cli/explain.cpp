@@ -6,6 +6,7 @@
 #include <cstring>
 
 #include <kova/fs.h>
+#include <kova/lock_holder.h>
 
 #include "common/file_util.h"
 #include "fileindex/util.h"
@@ -61,8 +62,16 @@ bool IsDaemonChannel(const std::string& reason) {
   return StringStartWith(reason, "write failed") || StringStartWith(reason, "read failed");
 }
 
+/// Of a lock that was waited for in vain.
+std::string HolderOf(const std::string& reason) {
+  const size_t path = reason.rfind("path=");
+  const std::string holder = path == std::string::npos ? "" : kova::LockHolderText(reason.substr(path + 5));
+  return holder.empty() ? "" : holder + "; end it if it hangs, and try again";
+}
+
 std::string RemedyFor(const Error& error) {
   const std::string reason = error.what();
+  if (error.Code() == Error::kLockFailed && !HolderOf(reason).empty()) return HolderOf(reason);
   if (error.Code() == Error::kPathNotIndexable && StringStartWith(reason, kNotIndexable)) {
     return WhyNotIndexable(reason.substr(sizeof(kNotIndexable) - 1));
   }

@@ -60,6 +60,7 @@ void PrepareInstance(Needs needs) {
     const std::string path = ferrox::InstancePath(folder);
     if (!ferrox::services::MakeFolders(path)) ThrowSystemFailure(errno, "make", path);
   }
+  ferrox::services::GuardLockFiles();
 }
 
 [[noreturn]] void ThrowNoCommand(const std::string& word) {

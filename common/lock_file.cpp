@@ -3,11 +3,14 @@
 #include <fcntl.h>
 #include <sys/file.h>
 #include <sys/stat.h>
+#include <syslog.h>
 #include <unistd.h>
 
 #include <cerrno>
 #include <chrono>
 #include <cstdlib>
+
+#include <kova/lock_holder.h>
 
 #include "common/clock.h"
 #include "common/log.h"
@@ -42,6 +45,14 @@ bool IsStillAt(int fd, const std::string& path) {
 
 void WaitForNextAttempt() { Clock::Get().SleepFor(std::chrono::milliseconds(100 * (rand() % 10))); }
 
+/// Who keeps a lock for longer than anybody waits is worth knowing.
+void LogHolder(const std::string& path) {
+  const int saved_errno = errno;
+  const std::string holder = kova::LockHolderText(path);
+  if (!holder.empty()) Log(LOG_WARNING, "%s: %s", path.c_str(), holder.c_str());
+  errno = saved_errno;
+}
+
 }  // namespace
 
 LockFile::LockFile(const std::string& path, bool exclusive) : path_(path) {
@@ -67,6 +78,7 @@ LockFile::LockFile(const std::string& path, bool exclusive) : path_(path) {
     // A renamed file frees its path at once; only a held lock is worth waiting for.
     if (!locked) WaitForNextAttempt();
   }
+  LogHolder(path_);
   FERROX_FAIL_IF_AS(true, "kAttempts <= attempt", Error::kLockFailed, "Exceed max retry, path=" + path_);
 }
 

@@ -14,6 +14,7 @@ class FERROX_EXPORT LockFile {
   /// Takes the lock, exclusive or shared. It counts as had only when the locked file is still the one at `path`, so
   /// that a file that was renamed away in between is not mistaken for it. Links are not followed; only a regular file
   /// serves. Blocks while the lock is held elsewhere: 64 attempts, 0 to 0.9 s apart, at most about 58 s.
+  /// Then who holds it is logged.
   /// @throws Error kLockFailed when the file cannot be opened, is no regular file, or stays locked.
   LockFile(const std::string& path, bool exclusive);
   /// The lock if it can be had at once; else null, with errno set: EWOULDBLOCK while it is held elsewhere. Logs

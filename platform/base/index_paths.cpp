@@ -1,6 +1,7 @@
 #include "platform/base/index_paths.h"
 
 #include <sys/stat.h>
+#include <unistd.h>
 
 #include <cerrno>
 #include <cinttypes>
@@ -53,8 +54,10 @@ std::string Compose(const std::string& share_path, const char* folder_name, cons
   const std::string folder = state + "/" + folder_name;
   const size_t own = state.rfind('/');
   struct stat info = {};
-  const bool made = stat(folder.c_str(), &info) == 0 ||
-                    (MakeFolders(state.substr(0, own), 0, 0755) && MakeFolders(folder, own, 0700));
+  const bool is_there = stat(folder.c_str(), &info) == 0;
+  // Whoever can open what lies here can hold its lock.
+  if (is_there && (info.st_mode & 077) != 0 && info.st_uid == geteuid()) (void)chmod(folder.c_str(), 0700);
+  const bool made = is_there || (MakeFolders(state.substr(0, own), 0, 0755) && MakeFolders(folder, own, 0700));
   if (!made) {
     (void)KOVA_FAIL_ERRNO();
     return {};

@@ -14,8 +14,10 @@
 #include <cstdlib>
 #include <cstring>
 #include <fstream>
+#include <vector>
 
 #include <kova/instance.h>
+#include <kova/lock_holder.h>
 
 #include "platform/base/failure.h"
 #include "platform/base/frames.h"
@@ -50,6 +52,10 @@ pid_t ReadPid(int fd) {
 /// looking does not get in the way of a daemon that is just taking it.
 pid_t RunningPid(const ServiceRow& service) {
   const Fd file(open(PidPath(service).c_str(), O_RDONLY | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK));
+  if (!file.Valid() && errno == EACCES) {  // only its owner can open it
+    const std::vector<LockHolder> holders = LockHolders(PidPath(service));
+    return holders.empty() ? 0 : holders.front().pid;
+  }
   if (!file.Valid()) return 0;
   const pid_t pid = ReadPid(file.Get());
   if (pid == 0 || (kill(pid, 0) != 0 && errno == ESRCH)) return 0;
@@ -105,8 +111,8 @@ std::streamoff FileSize(const std::string& path) {
 class SwitchLock {
  public:
   explicit SwitchLock(const ServiceRow& service)
-      : file_(open((InstanceRoot() + "/var/run/" + service.program + ".switch").c_str(),
-                   O_RDWR | O_CREAT | O_CLOEXEC | O_NOFOLLOW, 0600)) {}
+      : path_(InstanceRoot() + "/var/run/" + service.program + ".switch"),
+        file_(open(path_.c_str(), O_RDWR | O_CREAT | O_CLOEXEC | O_NOFOLLOW, 0600)) {}
 
   bool Take() {
     const auto deadline = SteadyClock::now() + kOthersMax;
@@ -117,7 +123,15 @@ class SwitchLock {
     return file_.Valid();
   }
 
+  /// Why it could not be had.
+  std::string Problem() const {
+    if (!file_.Valid()) return InstanceRoot() + "/var/run cannot be written";
+    const std::string holder = LockHolderText(path_);
+    return "another start or stop of it hangs" + (holder.empty() ? "" : ": " + holder + " on " + path_);
+  }
+
  private:
+  std::string path_;
   Fd file_;
 };
 
@@ -153,8 +167,7 @@ bool WaitUntilGone(const ServiceRow& service, pid_t pid, std::chrono::seconds lo
 /// Takes the lock that a start or a stop needs, and the folders it needs.
 int Prepare(const ServiceRow& service, SwitchLock& lock) {
   if (lock.Take()) return 0;
-  return ServiceFailure(KOVA_ERR_SYSTEM, std::string(service.program) + " cannot be switched: " + InstanceRoot() +
-                                             "/var/run cannot be written, or another start or stop of it hangs");
+  return ServiceFailure(KOVA_ERR_SYSTEM, std::string(service.program) + " cannot be switched: " + lock.Problem());
 }
 
 }  // namespace

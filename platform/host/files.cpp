@@ -1,11 +1,13 @@
 #include "platform/host/files.h"
 
 #include <fcntl.h>
+#include <poll.h>
 #include <sys/file.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
 #include <cerrno>
+#include <chrono>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
@@ -15,9 +17,13 @@
 
 #include <json/reader.h>
 
+#include <kova/lock_holder.h>
+
 namespace kova::host {
 
 namespace {
+
+constexpr std::chrono::seconds kLockMax(10);
 
 bool ReadAll(int fd, std::string& text) {
   char buffer[16384];
@@ -55,8 +61,8 @@ std::string Parse(const std::string& text, Json::Value& value) {
 
 /// O_NONBLOCK: a FIFO at the path must not hold the opener.
 int OpenLockFile(const std::string& path) {
-  if (!MakeFolders(FolderOf(path), 0755)) return -1;
-  return open(path.c_str(), O_RDWR | O_CREAT | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK, 0644);
+  if (!MakeFolders(FolderOf(path), 0755) || !MakeLockFilePrivate(path)) return -1;
+  return open(path.c_str(), O_RDWR | O_CREAT | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK, 0600);
 }
 
 /// Gives an open file the owner and the mode of `like`; chown takes bits of the mode away and goes first.
@@ -82,12 +88,22 @@ bool Fd::Close() { return close(std::exchange(fd_, -1)) == 0; }
 
 int Fd::Release() { return std::exchange(fd_, -1); }
 
-ExclusiveLock::ExclusiveLock(const std::string& path) : file_(OpenLockFile(path)) {
-  while (!file_.Valid() || flock(file_.Get(), LOCK_EX) != 0) {
-    if (file_.Valid() && errno == EINTR) continue;
+ExclusiveLock::ExclusiveLock(const std::string& path) : path_(path), file_(OpenLockFile(path)) {
+  constexpr int kPollMs = 20;
+  const auto deadline = std::chrono::steady_clock::now() + kLockMax;
+  while (!file_.Valid() || flock(file_.Get(), LOCK_EX | LOCK_NB) != 0) {
+    const bool is_held = file_.Valid() && (errno == EINTR || errno == EWOULDBLOCK);
     problem_ = errno;
-    return;
+    if (!is_held || std::chrono::steady_clock::now() > deadline) return;
+    (void)poll(nullptr, 0, kPollMs);
   }
+  problem_ = 0;
+}
+
+std::string ExclusiveLock::ProblemText() const {
+  const std::string holder = problem_ == EWOULDBLOCK ? LockHolderText(path_) : std::string();
+  return "cannot lock " + path_ + ": " +
+         (holder.empty() ? std::string(strerror(problem_)) : holder + "; end it if it hangs, and try again");
 }
 
 std::string FolderOf(const std::string& path) {

@@ -27,15 +27,19 @@ class Fd {
   int fd_;
 };
 
-/// Holds an exclusive lock on a file, made when missing as are the folders above it, for the time of a scope. Waits
-/// while another process or thread holds it. Links are not followed, programs that are started do not inherit it.
+/// Holds an exclusive lock on a file, made when missing as are the folders above it, for the time of a scope; others
+/// cannot open it. Waits while another process or thread holds it, at most 10 s. Links are not followed, programs that
+/// are started do not inherit it.
 class ExclusiveLock {
  public:
   explicit ExclusiveLock(const std::string& path);
   /// 0 when the lock is held, else why not: an error number.
   int Problem() const { return problem_; }
+  /// The same in words: a sentence that names the file, and the process that holds the lock.
+  std::string ProblemText() const;
 
  private:
+  std::string path_;
   Fd file_;
   int problem_ = 0;
 };

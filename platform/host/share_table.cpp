@@ -62,9 +62,7 @@ Json::Value ToJson(const ShareEntry& entry) {
 class TableLock {
  public:
   TableLock() : lock_(ShareTablePath() + ".lock") {
-    if (lock_.Problem() != 0) {
-      throw ShareTableError("cannot lock " + ShareTablePath() + ".lock: " + strerror(lock_.Problem()));
-    }
+    if (lock_.Problem() != 0) throw ShareTableError(lock_.ProblemText());
   }
 
  private:

@@ -11,10 +11,15 @@
 #include <syslog.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <cerrno>
 #include <chrono>
 #include <cstdlib>
 #include <cstring>
+#include <exception>
+#include <vector>
+
+#include <kova/lock_holder.h>
 
 #include "common/clock.h"
 #include "common/file_util.h"
@@ -46,22 +51,41 @@ void MakeStacksSmall() {
 }
 
 /// A process that was killed lets go of its locks only when the last of its threads has ended.
-bool LockWithPatience(int fd) {
-  constexpr int kAttempts = 20;
+bool LockWithPatience(int fd, const std::string& path) {
+  constexpr int kAttempts = 20, kAttemptsOfEnding = 200;
   constexpr std::chrono::milliseconds kPause(50);
   for (int attempt = 1; flock(fd, LOCK_EX | LOCK_NB) != 0; ++attempt) {
-    if (errno != EWOULDBLOCK || attempt == kAttempts) return false;
+    if (errno != EWOULDBLOCK || attempt == kAttemptsOfEnding) return false;
+    const auto lives = [](const kova::LockHolder& holder) { return !kova::IsEnding(holder.pid); };
+    const bool asks = attempt % kAttempts == 0;  // that looks at all processes
+    const std::vector<kova::LockHolder> holders = asks ? kova::LockHolders(path) : std::vector<kova::LockHolder>();
+    if (std::any_of(holders.begin(), holders.end(), lives)) return false;
     Clock::Get().SleepFor(kPause);
   }
   return true;
 }
 
+bool IsStillAt(int fd, const std::string& path) {
+  struct stat opened = {}, named = {};
+  return fstat(fd, &opened) == 0 && lstat(path.c_str(), &named) == 0 && opened.st_dev == named.st_dev &&
+         opened.st_ino == named.st_ino;
+}
+
+std::string PidPath(const std::string& name) { return InstancePath(("/var/run/" + name + ".pid").c_str()); }
+
 /// The pid file of a running process is locked by it; what is written in it is only for people.
 UniqueFd TakePidFile(const std::string& path, const std::string& name) {
-  UniqueFd file(open(path.c_str(), O_RDWR | O_CREAT | O_CLOEXEC | O_NOFOLLOW, 0644));
-  FERROX_FAIL_IF(!file.Valid(), Error::kInternal, "cannot open " + path + ": " + ErrnoText());
-  FERROX_FAIL_IF(!LockWithPatience(file.Get()), Error::kInternal,
-                 name + " runs already in this instance (" + path + " is locked); stop it first");
+  FERROX_FAIL_IF(!kova::MakeLockFilePrivate(path), Error::kInternal, "cannot make " + path + ": " + ErrnoText());
+  UniqueFd file;
+  do {  // it may just have been replaced
+    file.Reset(open(path.c_str(), O_RDWR | O_CREAT | O_CLOEXEC | O_NOFOLLOW, 0600));
+    FERROX_FAIL_IF(!file.Valid(), Error::kInternal, "cannot open " + path + ": " + ErrnoText());
+    const bool locked = LockWithPatience(file.Get(), path);
+    const std::string holder = locked ? "" : kova::LockHolderText(path);
+    FERROX_FAIL_IF(!locked, Error::kInternal,
+                   name + " runs already in this instance (" + path + " is locked" +
+                       (holder.empty() ? "" : ": " + holder) + "); stop it first");
+  } while (!IsStillAt(file.Get(), path));
   const std::string text = std::to_string(getpid()) + "\n";
   const bool written =
       ftruncate(file.Get(), 0) == 0 && write(file.Get(), text.data(), text.size()) == static_cast<ssize_t>(text.size());
@@ -76,6 +100,15 @@ bool MakeFolders(const std::string& path, mode_t mode) {
   return errno == ENOENT && MakeFolders(Dirname(path), mode) && (mkdir(path.c_str(), mode) == 0 || errno == EEXIST);
 }
 
+void GuardLockFiles() {
+  for (const char* path : {kFolderLockPath, kStatusLockPath}) {
+    if (!kova::MakeLockFilePrivate(InstancePath(path))) {
+      Log(LOG_WARNING, "others can hold the lock file %s, and it cannot be replaced: %s", InstancePath(path).c_str(),
+          ErrnoText().c_str());
+    }
+  }
+}
+
 Daemon::Daemon(const std::string& name) : name_(name) {
   openlog(name_.c_str(), LOG_PID | (InstancePath("").empty() ? 0 : LOG_PERROR), LOG_DAEMON);
   const std::string problem = InstanceRootProblem();
@@ -87,8 +120,15 @@ Daemon::Daemon(const std::string& name) : name_(name) {
   MakeStacksSmall();
   stop_fd_ = BlockSignals();
   FERROX_FAIL_IF(!stop_fd_.Valid(), Error::kInternal, "signalfd: " + ErrnoText());
-  pid_file_ = TakePidFile(InstancePath(("/var/run/" + name_ + ".pid").c_str()), name_);
+  pid_file_ = TakePidFile(PidPath(name_), name_);
+  GuardLockFiles();
 }
+
+Daemon::~Daemon() {
+  if (std::uncaught_exceptions() == 0) (void)!ftruncate(pid_file_.Get(), 0);
+}
+
+bool Daemon::HasPidFile() const { return IsStillAt(pid_file_.Get(), PidPath(name_)); }
 
 void Daemon::NotifyReady() {
   const char* address = getenv("NOTIFY_SOCKET");

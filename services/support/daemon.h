@@ -8,22 +8,31 @@ namespace ferrox::services {
 
 /// What every daemon does at its start, in this order: refuses an unusable instance root, makes the instance's runtime
 /// folders, opens the log (standard error too in an instance), turns SIGTERM and SIGINT into StopFd, ignores SIGHUP and
-/// SIGPIPE, and takes the pid file, whose lock lasts as long as the process.
+/// SIGPIPE, takes the pid file, whose lock lasts as long as the process, and sees to the instance's lock files.
 class Daemon {
  public:
   /// @throws Error kInternal with a sentence when the root is unusable or another process already has the pid file.
   explicit Daemon(const std::string& name);
+  Daemon(const Daemon&) = delete;
+  Daemon& operator=(const Daemon&) = delete;
+  /// Empties the pid file, unless it is an exception that ends the daemon: what a killed one leaves is told apart.
+  ~Daemon();
 
   /// Becomes readable when the daemon was asked to stop (SIGTERM, SIGINT).
   int StopFd() const { return stop_fd_.Get(); }
   /// Tells whoever started the daemon that it is ready (a service manager by its notification socket).
   void NotifyReady();
+  /// Whether its pid file is still where it belongs: the folder of a private instance may have been removed.
+  bool HasPidFile() const;
 
  private:
   std::string name_;
   UniqueFd pid_file_;
   UniqueFd stop_fd_;
 };
+
+/// Keeps others from the lock files that all processes of the instance share (kova/lock_holder.h).
+void GuardLockFiles();
 
 /// Makes a folder and those above it, mode 0755 unless said; true when it exists afterwards.
 bool MakeFolders(const std::string& path, mode_t mode = 0755);

@@ -1,12 +1,13 @@
 """The daemons and the tool together, as a person meets them."""
 
+import fcntl
 import json
 import os
 import signal
 import time
 import unittest
 
-from instance import CREATE, MODIFY, RENAME, InstanceTestCase, event, on_disk, to_bytes, wait_for, write
+from instance import CREATE, DAEMONS, MODIFY, RENAME, InstanceTestCase, event, on_disk, to_bytes, wait_for, write
 
 
 class DaemonsTest(InstanceTestCase):
@@ -144,6 +145,55 @@ class DaemonsTest(InstanceTestCase):
         self.assertEqual(3, done.returncode)
         self.assertIn("does not answer", status["engine"]["problem"])
         self.assertEqual(["a", "b", "c"], [share["share"] for share in status["index_daemon"]["shares"]])
+
+    def holder(self, paths, user):
+        """A process that holds shared locks on those of the files that the user may open; and how many these are."""
+        answer, question = os.pipe()
+        pid = os.fork()
+        if pid == 0:
+            os.setresuid(user, user, user)
+            held = []
+            for path in paths:
+                try:
+                    held.append(os.open(path, os.O_RDONLY))
+                    fcntl.flock(held[-1], fcntl.LOCK_SH)
+                except PermissionError:
+                    pass
+            os.write(question, bytes([len(held)]))
+            signal.pause()
+        self.addCleanup(os.waitpid, pid, 0)
+        self.addCleanup(os.kill, pid, signal.SIGKILL)
+        return pid, os.read(answer, 1)[0]
+
+    @unittest.skipIf(os.geteuid() != 0, "only root can become somebody else")
+    def test_locks_of_others_stop_nothing(self):
+        root, nobody = self.instance.root, 65534
+        os.chmod(root, 0o755)
+        folder = self.up_with_share()
+        self.instance.wait_idle("docs", folder)
+        self.ctl("folder", "reindex", "/docs")
+        locks = [f"{root}/{name}" for name in ("etc/kova/shares.json.lock", "tmp/ferrox_cfg_folder.lock",
+                                               "tmp/ferrox_cfg_fi_status.lock",
+                                               *(f"var/run/{program}.pid" for program in DAEMONS))]
+        self.assertTrue(all(map(os.path.isfile, locks)), locks)
+        self.assertEqual(0, self.holder(locks + [self.instance.queue_path(folder)], nobody)[1])
+        self.ctl("down")
+        # What an earlier version left behind, in the hands of somebody else.
+        for path in locks:
+            os.chmod(path, 0o644)
+        self.assertEqual(len(locks), self.holder(locks, nobody)[1])
+        os.chmod(locks[1], 0o600)
+        begin = time.monotonic()
+        self.ctl("up")
+        self.instance.add_share("more")
+        self.ctl("folder", "delete", "/docs")
+        self.assertLess(time.monotonic() - begin, 8, "less than any wait for a lock")
+        self.assertEqual(0, self.holder(locks, nobody)[1])
+        # Who may open them is waited for, and told.
+        pid, held = self.holder(locks[:1], 0)
+        self.assertEqual(1, held)
+        self.assertRegex(self.instance.run("share", "remove", "more").stderr.decode(),
+                         f"shares.json.lock: process {pid} .python.* of user 0 holds the lock; end it")
 
     def test_bad_requests_are_answered(self):
         self.up_with_share()
