@@ -13,6 +13,7 @@
 #include "cli/left_out.h"
 #include "cli/progress.h"
 #include "common/error.h"
+#include "common/file_util.h"
 #include "fileindex/folder_mgr.h"
 #include "fileindex/index_mgr.h"
 #include "fileindex/optree.h"
@@ -28,8 +29,9 @@ namespace {
 using SteadyClock = std::chrono::steady_clock;
 
 constexpr int kPollMs = 100;
-/// An error that lasts so long is told; the daemon itself goes on trying.
+/// An error, or waiting for something else, that lasts so long is told; the daemon itself goes on trying.
 constexpr std::chrono::seconds kErrorPatience(5);
+constexpr std::chrono::seconds kWaitPatience(30);
 
 struct Share {
   std::string name;
@@ -75,25 +77,28 @@ bool ReindexIsPending(const Share& share, const Json::Value& status) {
   throw Failure("the index daemon does not index " + share + "; 'fileindexctl down' and 'up' make it look again");
 }
 
+[[noreturn]] void ThrowPaused(const std::string& share) {
+  const long long until = fileindex::StatusMgr().GetPauseInfo();
+  throw Failure("indexing is paused" + (until > 0 ? " until " + Date(until) : "") + "; share " + share +
+                " is compared when it goes on, which 'fileindexctl resume' makes it do");
+}
+
 /// Returns the share's last status.
 Json::Value WaitUntilDone(const Share& share) {
   Progress progress(isatty(STDERR_FILENO) == 1);
   auto last_good = SteadyClock::now();
-  std::string told;
   while (true) {
     Json::Value status = ShareStatusOf(share.name);
     if (status.isNull()) ThrowNotWorkedOn(share.name);
     const std::string state = TextOf(status, "state");
-    if (state != "error") last_good = SteadyClock::now();
+    const bool stuck = state == "error" || StringStartWith(state, "waiting");
+    if (!stuck) last_good = SteadyClock::now();
     if (!ReindexIsPending(share, status)) return ShareStatusOf(share.name);
-    if (SteadyClock::now() - last_good > kErrorPatience) {
+    if (state == "paused") ThrowPaused(share.name);
+    if (SteadyClock::now() - last_good > (state == "error" ? kErrorPatience : kWaitPatience)) {
       throw Failure("share " + share.name + ": " + TextOf(status, "detail") +
                     "; the index daemon tries again by itself");
     }
-    if (state == "paused" && told != state) {
-      (void)fprintf(stderr, "indexing is paused; it goes on after 'fileindexctl resume'\n");
-    }
-    told = state;
     progress.Show(status);
     (void)poll(nullptr, 0, kPollMs);
   }

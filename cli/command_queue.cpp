@@ -4,26 +4,43 @@
 
 #include <cerrno>
 #include <cstdio>
+#include <fstream>
 #include <sstream>
 
 #include "cli/command_table.h"
 #include "cli/escape.h"
 #include "cli/rights.h"
+#include "common/json_util.h"
 #include "fileindex/optree.h"
 
 namespace ferrox::cli {
 
 namespace {
 
+constexpr char kRemedy[] = "; give the path of a share's queue file";
+
 using OpPtr = std::shared_ptr<fileindex::OP>;
 
 void CheckReadable(const std::string& path) {
   struct stat status = {};
   const bool there = stat(path.c_str(), &status) == 0;
-  constexpr char kRemedy[] = "; give the path of a share's queue file";
   if (!there) ThrowSystemFailure(errno, "read", path, kRemedy);
   if (!S_ISREG(status.st_mode)) throw Failure(path + " is not a file" + kRemedy);
   if (faccessat(AT_FDCWD, path.c_str(), R_OK, AT_EACCESS) != 0) ThrowSystemFailure(errno, "read", path);
+}
+
+/// A file of anything else would pass for a queue in which nothing is queued.
+void RequireQueue(const std::string& path) {
+  constexpr size_t kLookedAtBytes = 1 << 20;
+  std::string beginning(kLookedAtBytes, '\0');
+  std::ifstream file(path);
+  (void)file.read(beginning.data(), static_cast<std::streamsize>(beginning.size()));
+  beginning.resize(static_cast<size_t>(file.gcount()));
+  for (const std::string& line : Split(beginning, '\n')) {
+    Json::Value event;
+    if (fromString(event, line) && event.isObject() && event.isMember("event")) return;
+  }
+  if (!beginning.empty()) throw Failure(path + " is no queue file: no line at its beginning is an event" + kRemedy);
 }
 
 void PrintText(const OpPtr& op) {
@@ -44,6 +61,7 @@ void PrintJson(const OpPtr& op) {
 int RunQueueShow(const Arguments& arguments) {
   const std::string& path = arguments.words[0];
   CheckReadable(path);
+  RequireQueue(path);
   fileindex::OPTree tree(path);
   const int count = tree.ProcessOP(arguments.Has("--json") ? &PrintJson : &PrintText);
   if (fflush(stdout) != 0) throw Failure("standard output cannot be written");

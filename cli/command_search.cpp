@@ -160,6 +160,11 @@ bool IsFresh(const Arguments& arguments, Scope& scope) try {
   return goes_on;
 }
 
+Json::Value Ask(const Json::Value& request) try { return Search(request); } catch (const Refusal& refusal) {
+  if (refusal.Code() != Error::kEngineBadRequest) throw;
+  throw UsageError(EscapeForTerminal(refusal.Reason()));  // the words themselves cannot be understood
+}
+
 /// The engine's answer, also where no share is left to ask it about.
 Json::Value SearchIn(const Arguments& arguments, Scope& scope) {
   if (scope.known && scope.shares.empty() && !scope.left_out.Empty()) {
@@ -169,7 +174,7 @@ Json::Value SearchIn(const Arguments& arguments, Scope& scope) {
     scope.searched = false;
     return nothing;
   }
-  Json::Value result = Search(SearchRequest(arguments, scope));
+  Json::Value result = Ask(SearchRequest(arguments, scope));
   scope.searched = scope.shares.empty() || result["left_out"].size() < scope.shares.size();
   scope.left_out.AddFrom(result["left_out"]);
   return result;

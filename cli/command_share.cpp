@@ -6,6 +6,7 @@
 #include "cli/command_table.h"
 #include "cli/configuration_change.h"
 #include "cli/escape.h"
+#include "cli/explain.h"
 #include "cli/own_share.h"
 #include "cli/rights.h"
 #include "cli/share_remains.h"
@@ -13,6 +14,7 @@
 #include "common/file_util.h"
 #include "fileindex/folder_mgr.h"
 #include "fileindex/index_mgr.h"
+#include "platform/host/share_rules.h"
 #include "sdk/share.h"
 
 namespace ferrox::cli {
@@ -55,23 +57,44 @@ bool MakeWay(const kova::host::ShareEntry& entry, bool replace) {
   for (const auto& known : kova::host::ListShares()) {
     if (known.name != entry.name) continue;
     if (known.path == entry.path) return true;
-    if (replace) RemoveShare(known.name);
+    if (!replace) continue;
+    const std::string problem = kova::host::ShareFolderProblem(entry);
+    if (!problem.empty()) throw Failure(problem);
+    RemoveShare(known.name);
   }
   return false;
 }
 
-/// The share itself stays when its indexing cannot begin.
-void IndexWholeShare(const std::string& name) {
+/// Undoes what an add has done before it failed. @return whether nothing of it is left.
+bool TakeBack(const std::string& name, bool added) try {
+  const std::string queue_path = sdk::SDKShare(name).GetQueuePath();
+  try {
+    const Json::Value folders = FoldersOf(name);
+    if (!folders.empty()) fileindex::FolderDelete(folders);
+    DropRemains(name, queue_path);
+    Unregister(queue_path);
+  } catch (const std::exception&) {
+    // What is left then is what a daemon that is away has of it.
+  }
+  if (!FoldersOf(name).empty()) return false;
+  if (added) kova::host::RemoveShare(name);
+  return true;
+} catch (const std::exception&) {
+  return false;
+}
+
+/// An add that fails leaves nothing.
+void IndexWholeShare(const std::string& name, bool added) {
   const std::string path = "/" + name;
   Json::Value list(Json::arrayValue);
   list.append(fileindex::Folder(path, name, true, true, true, true, false, false).GetData());
   try {
-    RequireEngine();
-    ChangeConfiguration([&] { fileindex::FolderAdd(list, false); });
-  } catch (const Failure& failure) {
-    if (!FoldersOf(name).empty()) throw;
-    throw Failure(std::string(failure.what()) + "; the share is there, but not indexed: 'fileindexctl folder add " +
-                  path + "' does that later");
+    fileindex::FolderAdd(list, false);
+  } catch (const Error& error) {
+    const std::string left = TakeBack(name, added)
+                                 ? (added ? "the share is not added" : "the share is not indexed")
+                                 : "'fileindexctl share remove " + name + "' takes back what was done";
+    throw Failure(Explain(error, left));
   }
 }
 
@@ -81,10 +104,11 @@ int RunShareAdd(const Arguments& arguments) {
   kova::host::ShareEntry entry;
   entry.path = RealFolder(arguments.words[0]);
   entry.name = arguments.Get("--name", Basename(entry.path));
+  if (!arguments.Has("--no-index")) RequireEngine();
   const bool known = MakeWay(entry, arguments.Has("--replace"));
   if (!known) kova::host::AddShare(entry);
   const bool index = !arguments.Has("--no-index") && FoldersOf(entry.name).empty();
-  if (index) IndexWholeShare(entry.name);
+  if (index) IndexWholeShare(entry.name, !known);
   (void)printf("share %s: %s%s%s\n", EscapeForTerminal(entry.name).c_str(), EscapeForTerminal(entry.path).c_str(),
                known ? " (a share already)" : "", index ? ", all of it is indexed" : "");
   return kDone;

@@ -145,7 +145,10 @@ std::string ContentExtractionText(const Json::Value& daemon) {
   return text;
 }
 
-int ExitCodeOf(const InstanceState& state) {
+/// `needed`: folders are indexed, which takes more than the engine. Content extraction starts by itself.
+int ExitCodeOf(const InstanceState& state, bool needed) {
+  const bool stopped = needed && (state.index_daemon.status.isNull() || state.notification_daemon.status.isNull());
+  if (stopped || state.engine.status.isNull()) return kFailure;
   for (const DaemonState* daemon :
        {&state.engine, &state.index_daemon, &state.notification_daemon, &state.content_extraction}) {
     if (!daemon->problem.empty()) return kFailure;
@@ -162,6 +165,9 @@ int RunStatus(const Arguments& arguments) {
   AddWatches(notification_daemon, daemon);
   std::string problem;
   const Json::Value resting = RestingShares(daemon, problem);
+  const bool has_shares = !daemon.isNull() && !daemon["shares"].empty();
+  const bool needed = has_shares || !resting.empty();
+  const int code = problem.empty() ? ExitCodeOf(state, needed) : kFailure;
   if (arguments.Has("--json")) {
     Json::Value json;
     json["engine"] = StatusJson(state.engine);
@@ -171,14 +177,12 @@ int RunStatus(const Arguments& arguments) {
     json["resting_shares"] = resting;
     if (!problem.empty()) json["problem"] = problem;
     (void)printf("%s\n", ToScriptJson(json).c_str());
-    return ExitCodeOf(state);
+    return code;
   }
   PrintDaemon("search engine", state.engine, EngineText(state.engine.status));
-  const bool needed = !resting.empty() || !problem.empty();
-  PrintDaemon("index daemon", state.index_daemon, DaemonText(daemon, needed));
-  const bool has_shares = !daemon.isNull() && !daemon["shares"].empty();
+  PrintDaemon("index daemon", state.index_daemon, DaemonText(daemon, needed || !problem.empty()));
   PrintDaemon("notification daemon", state.notification_daemon,
-              NotificationDaemonText(notification_daemon, needed || has_shares));
+              NotificationDaemonText(notification_daemon, needed || !problem.empty()));
   PrintDaemon("content extraction", state.content_extraction, ContentExtractionText(state.content_extraction.status));
   if (!problem.empty()) (void)printf("indexed folders: %s\n", EscapeForTerminal(problem).c_str());
   if (!daemon.isNull()) {
@@ -193,7 +197,7 @@ int RunStatus(const Arguments& arguments) {
                  : state.index_daemon.problem.empty() ? "nothing works on it now"
                                                       : "what is done with it is not known");
   }
-  return ExitCodeOf(state);
+  return code;
 }
 
 }  // namespace ferrox::cli

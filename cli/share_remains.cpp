@@ -1,6 +1,7 @@
 #include "cli/share_remains.h"
 
 #include <kova/file_index.h>
+#include <kova/notifyd.h>
 
 #include "cli/ask.h"
 #include "common/error.h"
@@ -19,6 +20,12 @@ std::string QueueOf(const std::string& share_path) {
 
 void RemoveQueue(const std::string& queue_path) {
   for (const char* suffix : {"", ".tmp", ".folders"}) (void)Unlink(queue_path + suffix);
+}
+
+void Unregister(const std::string& queue_path) {
+  using namespace KOVA::KOVANOTIFYD;
+  const bool done = MonitorQueue::Delete(queue_path, "fileindex", MONITOR_QUEUE_TYPE_APPLICATION);
+  FERROX_FAIL_IF(!done, Error::kInternal, "the watch list of " + queue_path + " cannot be taken back");
 }
 
 /// The worker goes first, since it would make a dropped index anew.

@@ -15,4 +15,7 @@ void RemoveQueue(const std::string& queue_path);
 /// @throws Error as the engine's commands do.
 void DropRemains(const std::string& share, const std::string& queue_path);
 
+/// Takes a queue out of what the notification daemon writes to. @throws Error kInternal.
+void Unregister(const std::string& queue_path);
+
 }  // namespace ferrox::cli

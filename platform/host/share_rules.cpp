@@ -8,6 +8,7 @@
 #include <cstdlib>
 #include <cstring>
 
+#include <kova/fs.h>
 #include <kova/instance.h>
 
 #include "platform/base/path_match.h"
@@ -77,6 +78,9 @@ std::string ShareFolderProblem(const ShareEntry& share) {
   if (share.path != resolved) {
     return "the path " + share.path + " goes through a link or is not in its plain form; share " + resolved +
            " under the name \"" + NameOf(resolved) + "\"";
+  }
+  if (KOVAGetFSType(share.path.c_str(), 0) == KOVA_FS_PSEUDO) {
+    return share.path + " is the system's own and holds no files of users; choose another folder";
   }
   if (IsAtOrBelow(share.path, InstanceRoot() + "/var/lib/kova")) {
     return share.path + " holds the index's own files and cannot be a share; choose another folder";

@@ -12,7 +12,7 @@ namespace ferrox::engine {
 namespace {
 
 std::string NoSuchIndex(const std::string& id) {
-  return "there is no index \"" + id + "\"; create it first (index_create), or see index_list";
+  return "there is no index \"" + id + "\"; 'fileindexctl folder add' makes that of a share";
 }
 
 }  // namespace
@@ -204,7 +204,7 @@ Registry::OpenIndex Registry::Open(const std::string& id) {
     const auto still = entries_.find(id);
     FERROX_FAIL_IF(still == entries_.end() || still->second != entry, Error::kEngineNoSuchIndex, NoSuchIndex(id));
     FERROX_FAIL_IF(entry->paused, Error::kEngineIndexPaused,
-                   "the index \"" + id + "\" is paused; resume it first (index_resume)");
+                   "the index \"" + id + "\" is paused; 'fileindexctl share resume' goes on with it");
     path = entry->path;
   }
   OpenEntry(*entry, path, false);

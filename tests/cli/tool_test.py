@@ -157,8 +157,10 @@ class ToolTest(unittest.TestCase):
             (3, "share list", ["index", "nonexistent"]),
             (3, "share list", ["share", "remove", "nonexistent"]),
             (3, "No such file", ["queue", "show", "/nonexistent"]),
+            (3, "/etc/passwd is no queue file", ["queue", "show", "/etc/passwd"]),
             (3, "no such folder", ["share", "add", "/nonexistent"]),
-            (3, "mount --bind", ["share", "add", "/usr/share", "--name", "other"]),
+            (3, "/proc is the system's own", ["share", "add", "--no-index", "/proc"]),
+            (3, "mount --bind", ["share", "add", "--no-index", "/usr/share", "--name", "other"]),
             (3, "too long", ["--root", "/tmp/" + "x" * 100, "status"]),
             (1, "share add", ["--root", f"{self.root}/none", "share", "list"]),
             (0, "", ["--help"]),
@@ -289,6 +291,26 @@ class ToolTest(unittest.TestCase):
             self.assertEqual((0, f"/photo/trip: {told}\n/photos/a b: {told}\n"), (done.returncode, done.stdout.decode()))
         self.assertEqual(["index_pause"] * 2 + ["index_resume"] * 2, [name for name, _ in engine.asked if name != "ping"])
         self.assertIn(b"no folder was paused with the volume /;", self.run_tool("volume", "forget", "/").stderr)
+
+    def test_what_a_daemon_says_makes_the_exit_code(self):
+        refusal = {"success": False, "error": {"code": 1403, "msg": "query, character 1: no"}}
+        engine = self.daemon("kovaelasticd", ping=success({"pid": 4}), search=refusal)
+        self.assertEqual((2, True), ((done := self.run_tool("search", "(")).returncode, b"character 1" in done.stderr))
+        for folder in ("var/lib/kova/fileindex/queue", "tmp"):
+            os.makedirs(f"{self.root}/{folder}")
+        for state, detail, text in (("paused", "", "indexing is paused; share photo is compared when it goes on"),
+                                    ("error", "no", "share photo: no; the index daemon tries again")):
+            share = {"share": "photo", "path": "/v", "state": state, "detail": detail, "queued": 1, "failures": {}}
+            daemon = FakeDaemon(self.root, "fileindexd", {"notify_setting_changed": success({}), "status": success(
+                {"pid": 5, "workers": 1, "paused": False, "shares": [share]})})
+            done = self.run_tool("index", "--wait", "photo")
+            self.assertEqual((3, True), (done.returncode, text in done.stderr.decode()), done.stderr)
+            watching = FakeDaemon(self.root, "kovanotifyd", {"status": success({"pid": 6, "queues": []})})
+            codes = [self.run_tool("status").returncode]
+            watching.close()
+            codes.append(self.run_tool("status").returncode)
+            daemon.close()
+            self.assertEqual([0, 3, 3], codes + [self.run_tool("status").returncode])
 
     def test_search_of_a_hung_engine_ends(self):
         daemon = HungDaemon(self.root, "kovaelasticd", {})

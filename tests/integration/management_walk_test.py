@@ -239,10 +239,15 @@ class ManagementWalkTest(InstanceTestCase):
         self.expect_refused(913, "folder", "add", "/docs", text="'fileindexctl up'")
         media = f"{self.vol}/media"
         os.makedirs(media)
-        self.expect_refused(None, "share", "add", media, text="fileindexctl folder add /media")
-        self.assertIn(b"media", self.ctl("share", "list"))
+        shares = self.ctl("share", "list")
+        self.expect_refused(913, "share", "add", media, text="'fileindexctl up'")
         self.ctl("up")
-        self.ctl("folder", "add", "/docs", "/media")
+        os.mkdir(f"{self.instance.root}/var/packages/Ferrox/etc/fileindex.folders.new")  # stops root's writing, too
+        self.expect_refused(505, "share", "add", media, text="the share is not added")
+        os.rmdir(f"{self.instance.root}/var/packages/Ferrox/etc/fileindex.folders.new")
+        self.assertEqual((shares, {}, []), (self.ctl("share", "list"), self.indices(), self.files_below("var/lib/kova/notifyd/queues")))
+        self.ctl("folder", "add", "/docs")
+        self.ctl("share", "add", media)
         self.expect_documents("docs", docs, docs)
         self.instance.kill("fileindexd")
         for words in (["folder", "delete", "/docs"], ["share", "pause", "docs"], ["volume", "pause", "/"]):
