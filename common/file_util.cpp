@@ -103,8 +103,14 @@ std::string GetFileExtension(const std::string& path, bool lower) {
   return extension;
 }
 
+/// The kernel resolves a path at once, where realpath() asks it anew for each folder on the way.
 std::string RealPath(const std::string& path) {
   char resolved[PATH_MAX];
+  const UniqueFd opened(open(path.c_str(), O_PATH | O_CLOEXEC));
+  const std::string link = "/proc/self/fd/" + std::to_string(opened.Get());
+  const ssize_t size = opened.Valid() ? readlink(link.c_str(), resolved, sizeof(resolved)) : -1;
+  const std::string_view found(resolved, size > 0 && size < PATH_MAX ? static_cast<size_t>(size) : 0);
+  if (found.starts_with('/') && !found.ends_with(" (deleted)")) return std::string(found);
   return realpath(path.c_str(), resolved) != nullptr ? resolved : std::string();
 }
 

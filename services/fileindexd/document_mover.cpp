@@ -9,10 +9,15 @@
 
 namespace ferrox::indexd {
 
+using KOVA::CONTENT_EXTRACT::SameFile;
+using KOVA::CONTENT_EXTRACT::Stamp;
+
 namespace {
 
 /// A folder with fewer documents is moved in one request, which tells of each of them: both sides hold it in memory.
 constexpr unsigned kMovedAtOnce = 20000;
+/// Documents of which one may tell where a folder was: others may have been deleted or replaced since.
+constexpr unsigned kLookedAt = 1000;
 
 bool IsAtOrBelow(const std::string& path, const std::string& folder) {
   return StringStartWith(path + "/", folder + "/");
@@ -39,6 +44,24 @@ std::vector<DocumentMover::Step> DocumentMover::StepsOf(const std::string& path,
   if (IsAtOrBelow(path, old_path) || IsAtOrBelow(old_path, path)) return steps;
   for (const std::string& top : IndexedTopsOf(path)) steps.push_back({top, old_path + top.substr(path.size())});
   return steps;
+}
+
+/// Of a document of the folder's old place, what comes below the folder leads to the same file at the new one.
+std::string DocumentMover::RootBeforeMove(const std::string& top) {
+  struct stat status = {};
+  for (const IndexedEntry& document : index_.List(top, "", kLookedAt)) {
+    const std::string& path = document.path;
+    for (size_t end = top.size(); end != std::string::npos; end = path.find('/', end + 1)) {
+      const bool is_there = LookAt(root_ + path.substr(end), status) == Presence::kThere;
+      if (is_there && SameFile(document.stamp, Stamp(status))) return path.substr(0, end);
+    }
+  }
+  return "";
+}
+
+bool DocumentMover::DescribesFile(const std::string& path, const struct stat& status) {
+  const auto indexed = index_.Find(path);
+  return !indexed.empty() && SameFile(indexed.front().stamp, Stamp(status));
 }
 
 /// Of a folder with very many documents, each entry on its own; the folder's own document is left to the comparison.
@@ -68,7 +91,6 @@ std::vector<std::string> DocumentMover::IndexedTopsOf(const std::string& path) {
 /// Whether what the index has at the old path is what is at the new one now. When that has gone on to yet another
 /// place, a later rename will tell; the documents are its, unless there is something new at the old path.
 bool DocumentMover::HoldsDocumentsOf(const std::string& old_path, const std::string& path) {
-  using namespace KOVA::CONTENT_EXTRACT;  // NOLINT: its functions of stamps
   struct stat status = {};
   const auto indexed = index_.Find(old_path);
   if (indexed.empty()) return false;

@@ -30,6 +30,10 @@ class DocumentMover {
   /// What follows the rename of `old_path`, which lay outside the present root when the share itself was renamed or
   /// moved. Belongs to one thread.
   std::vector<Step> StepsOf(const std::string& path, const std::string& old_path);
+  /// The folder that was at `top`, or below it, and is the share's folder now, as far as documents there tell; or "".
+  std::string RootBeforeMove(const std::string& top);
+  /// Whether the document at `path` is of the file or folder that `status` is of, wherever that is by now.
+  bool DescribesFile(const std::string& path, const struct stat& status);
   /// From any thread. @throws Interrupted; Error.
   void Move(const Step& step);
 

@@ -49,7 +49,9 @@ void DocumentWriter::Write(const std::string& path) {
   if (LookAt(path, status) == Presence::kGone) return Remove(path);
   try {
     WillChange();
-    index_.Upsert(path, WantsContent(path, status));
+    const bool with_content = WantsContent(path, status);
+    if (with_content) status_.FileRead();
+    index_.Upsert(path, with_content);
     status_.DocumentWritten();
   } catch (const Error& error) {
     RecordFailure(error, path);

@@ -192,6 +192,7 @@ Json::Value IndexDaemon::OnStatus(const Json::Value&) {
   status["resume_time"] = Json::Int64(pause_.ResumeTime());
   status["paused"] = pause_.Paused();
   status["workers"] = pool_.Threads();
+  status["read"] = Json::UInt64(workers_.FilesRead());
   status["shares"] = workers_.Status();
   return status;
 }

@@ -28,6 +28,8 @@ constexpr auto kTimeBeforeCount = std::chrono::milliseconds(300);
 constexpr unsigned kRemovedAtOnce = 1000;
 /// So few changes are what somebody is waiting for, rather than a folder that is copied.
 constexpr uint64_t kUrgentOperations = 4;
+/// So many folders, and places that hold documents, are looked through for what has moved.
+constexpr size_t kTakenAlongMax = 100;
 
 /// Whether nothing can be indexed there: a walk leaves out what has such a path.
 bool IsTooLong(const std::string& path) { return path.size() >= PATH_MAX; }
@@ -74,12 +76,15 @@ void OperationRunner::Run(const std::function<void(const std::function<void(cons
   tasks_.SetUrgent(operations <= kUrgentOperations);
   each([this](const fileindex::OP& op) { CarryOut(op, Stage::kMove); });
   FinishMoves();
+  TakeFoldersAlong(also_compare);
+  const bool took_along = context_.may_hold_strays && TakeStraysAlong();
   follower_.Start();
   each([this](const fileindex::OP& op) {
     CarryOut(op, Stage::kLook);
     context_.status.OperationDone();
   });
   for (const std::string& path : also_compare) CompareOnce(path);
+  if (took_along) CompareOnce(context_.root);
   tasks_.Wait();
   StopFollowing();
   follower_.Check();
@@ -164,6 +169,44 @@ void OperationRunner::MoveRename(const std::string& path, const std::string& old
   for (const DocumentMover::Step& step : mover_.StepsOf(path, old_path)) {
     tasks_.Submit([this, step] { mover_.Move(step); });
   }
+}
+
+/// A share that was renamed or moved is watched, and so compared, at its new place by whoever is first to see it there,
+/// perhaps before the event of the move is queued, or in its place: what moves no documents would have every file read
+/// again.
+bool OperationRunner::TakeStraysAlong() {
+  std::vector<std::string> seen = {context_.root};
+  bool any = false;
+  for (std::string stray; seen.size() < kTakenAlongMax && !(stray = FindStray(context_.index, seen)).empty();) {
+    seen.push_back(TopOutside(stray, context_.root));
+    const std::string before = mover_.RootBeforeMove(seen.back());
+    if (before.empty()) continue;
+    MoveRename(context_.root, before);
+    FinishMoves();
+    any = true;
+  }
+  return any;
+}
+
+/// So it is with a folder that is indexed under another name now, as a user's renamed home.
+void OperationRunner::TakeFoldersAlong(const std::vector<std::string>& differing) {
+  std::vector<std::pair<std::string, struct stat>> there;
+  std::vector<std::string> others;
+  for (const std::string& folder : differing) {
+    struct stat status = {};
+    if (context_.folders.PlaceOf(folder) != Place::kIndexed) {
+      others.push_back(folder);
+    } else if (LookAt(folder, status) == Presence::kThere) {
+      there.emplace_back(folder, status);
+    }
+  }
+  if (there.size() > kTakenAlongMax || others.size() > kTakenAlongMax) return;
+  for (const std::string& other : others) {
+    for (const auto& [folder, status] : there) {
+      if (mover_.DescribesFile(other, status)) MoveRename(folder, other);
+    }
+  }
+  FinishMoves();
 }
 
 /// What concerns other paths than all that is under way may be done beside it; else the queue's order counts.

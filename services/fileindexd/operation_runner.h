@@ -41,6 +41,8 @@ struct PassContext {
   std::chrono::milliseconds keep_up_interval;
   /// Numbers of files that changed under names that tell nothing of the share's own.
   const std::set<uint64_t>& changed_files;
+  /// Whether the index may hold documents of an earlier place of the share.
+  bool may_hold_strays;
   /// Files that a pass wrote ahead of the pass that has their lines, which looks at them again. Kept by the worker.
   std::set<std::string>& written_ahead;
 };
@@ -91,6 +93,8 @@ class OperationRunner {
   void LookFullReindex(const std::string& path, const std::string& old_path);
 
   void CarryOut(const fileindex::OP& op, Stage stage);
+  bool TakeStraysAlong();
+  void TakeFoldersAlong(const std::vector<std::string>& differing);
   void BeginMove(const std::vector<std::string>& paths);
   void FinishMoves();
   void CommitIfDue();

@@ -144,6 +144,7 @@ Json::Value ShareStatus::ToJson() const {
       Json::Int64((comparing_ ? SteadyMilliseconds() : comparison_ended_ms_) - comparison_began_ms_);
   json["rate"] = rate_.PerSecond(SteadyMilliseconds());
   json["written"] = Json::UInt64(written_);
+  json["read"] = Json::UInt64(files_read_);
   json["deleted"] = Json::UInt64(deleted_);
   json["links_skipped"] = Json::UInt64(links_skipped_);
   if (last_commit_ != 0) json["last_commit"] = Json::Int64(last_commit_);

@@ -1,6 +1,7 @@
 #pragma once
 
 #include <array>
+#include <atomic>
 #include <cstdint>
 #include <map>
 #include <mutex>
@@ -57,6 +58,8 @@ class ShareStatus {
   void SetEstimate(uint64_t files, bool complete);
 
   void DocumentWritten();
+  void FileRead() { ++files_read_; }
+  uint64_t FilesRead() const { return files_read_; }
   void DocumentsDeleted(uint64_t count) { Add(deleted_, count); }
   void LinksSkipped(uint64_t count) { Add(links_skipped_, count); }
   /// A file that could not be indexed as it should; it did not stop the work.
@@ -86,6 +89,7 @@ class ShareStatus {
   uint64_t estimate_ = 0;
   bool estimate_complete_ = false;
   uint64_t written_ = 0;
+  std::atomic<uint64_t> files_read_{0};
   Rate rate_;
   uint64_t deleted_ = 0;
   uint64_t links_skipped_ = 0;

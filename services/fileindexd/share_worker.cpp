@@ -412,7 +412,7 @@ void ShareWorker::RunPass() {
   const ShareFolders folders = LoadFolders();
   const std::set<uint64_t> changed_files = ChangedNumbersIn(queue_path_ + ".tmp");
   OperationRunner runner({share_, root_, folders, *index_, environment_.pool, interruption_, status_, held, queue_path_,
-                          environment_.keep_up_interval, changed_files, written_ahead_});
+                          environment_.keep_up_interval, changed_files, !strays_looked_for_, written_ahead_});
   RunOperations(queue, runner, folders, changed_files.size() > kChangedNumbersMax);
   // What went away in the meantime, with its volume for example, looked as if it had been deleted.
   runner.CheckRoot();

@@ -94,6 +94,8 @@ class ShareWorker {
   /// Carries out what is queued now, if anything. @throws Interrupted; Error when it is to be tried again.
   void RunOnce();
 
+  /// How many files have been read for their content.
+  uint64_t FilesRead() const { return status_.FilesRead(); }
   static constexpr std::chrono::milliseconds kEngineWait{2000};
   /// Waits for the engine's figures at most for so long.
   Json::Value Status(std::chrono::milliseconds engine_wait = kEngineWait);

@@ -89,11 +89,19 @@ Json::Value WorkerSet::Status() const {
   return shares;
 }
 
+uint64_t WorkerSet::FilesRead() const {
+  const std::lock_guard lock(mutex_);
+  uint64_t files = read_by_ended_;
+  for (const auto& [share, worker] : workers_) files += worker->FilesRead();
+  return files;
+}
+
 /// Somebody may be asking the worker for its status, so that it is not gone when it is out of the set.
 void WorkerSet::End(const std::string& share) {
   const auto worker = workers_.find(share);
   if (worker == workers_.end()) return;
   worker->second->Stop();
+  read_by_ended_ += worker->second->FilesRead();
   workers_.erase(worker);
 }
 

@@ -47,6 +47,8 @@ class WorkerSet {
   void EndSyncs(const std::string& reason) const;
   /// One object a worker, in the order of the shares' names.
   Json::Value Status() const;
+  /// How many files have been read for their content, also by workers that are gone.
+  uint64_t FilesRead() const;
 
  private:
   enum class Command { kCreate, kDelete };
@@ -66,7 +68,8 @@ class WorkerSet {
   MakeWorker make_;
   mutable std::mutex mutex_;  ///< held while workers are made and stopped, so that commands keep their order
   std::map<std::string, Command> commanded_;
-  Workers workers_;  ///< shared with those who ask for its status
+  uint64_t read_by_ended_ = 0;  ///< files
+  Workers workers_;             ///< shared with those who ask for its status
 };
 
 }  // namespace ferrox::indexd

@@ -315,6 +315,39 @@ class ManagementWalkTest(InstanceTestCase):
         self.expect_documents("animals", animals, animals)
         self.expect_found("lynx", f"{animals}/cat.txt")
 
+    def test_what_moves_is_not_read_again(self):
+        self.ctl("up")
+        docs, homes = self.share_without_folders("docs"), self.share_without_folders("homes")
+        for folder in (f"{docs}/letters", f"{docs}/plans/old", f"{homes}/anna"):
+            for number in range(40):
+                write(f"{folder}/{number}.txt", f"ibex {number}")
+        self.ctl("folder", "add", "/docs", "/homes/anna")
+        papers, moved = f"{self.vol}/papers", f"{self.vol}/2/papers"
+        os.mkdir(f"{self.vol}/2")
+        steps = (  # what is done on the disk first, the command, and the folders that are indexed then
+            ([], [], docs, f"{homes}/anna"),
+            ([f"{docs}/plans", f"{docs}/drafts"], [], docs, f"{homes}/anna"),
+            ([], ["share", "rename", "docs", "papers"], papers, f"{homes}/anna"),
+            ([papers, moved], ["share", "migrate", "papers", moved], moved, f"{homes}/anna"),
+            ([], ["share", "pause", "papers"], None, None), ([], ["share", "resume", "papers"], moved, f"{homes}/anna"),
+            ([], ["pause"], None, None),  # else the folder may be taken for deleted before its new name is told
+            ([f"{homes}/anna", f"{homes}/carla"], ["user", "rename", "anna", "carla"], None, None),
+            ([], ["resume"], moved, f"{homes}/carla"),
+            ([], ["volume", "pause", self.vol], None, None), ([], ["volume", "resume", self.vol], moved, f"{homes}/carla"))
+        for disk, command, *indexed in steps:
+            with self.subTest(disk=disk, command=command):
+                if command[:2] == ["volume", "pause"]:
+                    self.instance.make_volume(self, self.vol)
+                if disk:
+                    os.rename(*disk)
+                if command:
+                    self.ctl(*command)
+                if indexed[0]:
+                    self.instance.run("search", "--fresh", "ibex")
+                    self.expect_documents(os.path.basename(indexed[0]), indexed[0], indexed[0])
+                    self.expect_documents("homes", homes, indexed[1])
+                self.assertEqual(120, self.instance.status()["index_daemon"]["read"])
+
     def test_interrupted_rename_is_finished_by_the_same_command(self):
         self.ctl("up")
         docs = self.share_without_folders("docs")
@@ -333,6 +366,7 @@ class ManagementWalkTest(InstanceTestCase):
             self.expect_documents(new, f"{self.vol}/{new}", f"{self.vol}/{new}")
             self.expect_found("lemur", f"{self.vol}/{new}/a.txt")
             self.assertEqual({f"fileindex_{new}"}, set(self.indices()))
+            self.assertEqual(1, self.instance.status()["index_daemon"]["read"], "the file, when it was new")
 
 
 if __name__ == "__main__":
