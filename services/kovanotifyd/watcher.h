@@ -65,6 +65,8 @@ class Watcher {
   /// `at_most`; false when nothing is left to do.
   virtual bool Advance(std::chrono::milliseconds at_most, WatchListener& listener) = 0;
 
+  /// Whether folders that something mounted hides are not watched, so that a root is to be added anew when it goes.
+  virtual bool WatchesEachFolder() const { return false; }
   /// How many watches the kernel keeps for the root.
   virtual uint64_t Watches(const std::string& root) const = 0;
 };

@@ -275,5 +275,28 @@ TEST_F(MountTest, AVolumeThatGoesIsNoDeletionAndOneThatComesIsCompared) {
   }
 }
 
+TEST_F(MountTest, WhatAMountBelowAFolderHidesAndShowsAgainIsCompared) {
+  const std::string point = root_ + "/sub/point";
+  fs::create_directories(point + "/registered");
+  const auto walk = [&](const std::vector<std::string>& registered) {
+    Follow(registered);
+    (void)Told();
+    std::string told = mount("none", point.c_str(), "tmpfs", 0, nullptr) == 0 ? "" : "failed ";
+    Examine();
+    told += "mounted: " + Told();
+    (void)umount(point.c_str());
+    Examine();
+    return told + "unmounted: " + Told();
+  };
+  const std::string compared = "compare /root/sub/point ";
+  if (!test::InChild(true, [&] {
+        EXPECT_EQ(walk({root_}), "mounted: " + compared + "unmounted: " + compared);
+        EXPECT_EQ(walk({dir_ / "root/other"}), "mounted: unmounted: ");
+        EXPECT_EQ(walk({root_, point + "/registered"}).find("point "), std::string::npos) << "it went with its volume";
+      })) {
+    GTEST_SKIP() << "no right to mount";
+  }
+}
+
 }  // namespace
 }  // namespace ferrox::notifyd

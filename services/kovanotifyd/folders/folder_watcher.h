@@ -38,6 +38,7 @@ class FolderWatcher : public Watcher {
   int Fd() const override { return port_->Fd(); }
   bool Read(WatchListener& listener) override;
   bool Advance(std::chrono::milliseconds at_most, WatchListener& listener) override;
+  bool WatchesEachFolder() const override { return true; }
   uint64_t Watches(const std::string& root) const override;
 
   const FolderTree& Folders() const { return tree_; }

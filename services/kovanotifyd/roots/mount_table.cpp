@@ -33,11 +33,14 @@ std::string Unescape(const std::string& text) {
 
 }  // namespace
 
-MountTable::MountTable(const char* path) : path_(path), fd_(open(path, O_RDONLY | O_CLOEXEC)) { Read(); }
+MountTable::MountTable(const char* path) : path_(path), fd_(open(path, O_RDONLY | O_CLOEXEC)) {
+  Read();
+  changed_.clear();
+}
 
 /// "36 35 98:0 /root /mount/point options [more]... - ext4 source options"; the options may change.
 void MountTable::Read() {
-  lines_.clear();
+  const Lines before = std::exchange(lines_, {});
   std::ifstream table(path_);
   for (std::string text; std::getline(table, text);) {
     std::istringstream fields(text);
@@ -53,6 +56,15 @@ void MountTable::Read() {
       type = text.substr(separator + 3, text.find(' ', separator + 3) - separator - 3);
     line.is_network = std::find(std::begin(kNetworkTypes), std::end(kNetworkTypes), type) != std::end(kNetworkTypes);
     lines_[id] = std::move(line);
+  }
+  NoteMissing(before, lines_);
+  NoteMissing(lines_, before);
+}
+
+void MountTable::NoteMissing(const Lines& lines, const Lines& others) {
+  for (const auto& [id, line] : lines) {
+    const auto other = others.find(id);
+    if (other == others.end() || other->second.entry != line.entry) changed_.insert(line.point);
   }
 }
 

@@ -2,7 +2,9 @@
 
 #include <cstdint>
 #include <map>
+#include <set>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "common/unique_fd.h"
@@ -24,6 +26,8 @@ class MountTable {
   /// Has something to tell (POLLPRI) after a mount or an unmount; -1 where that cannot be seen.
   int Fd() const { return fd_.Get(); }
   void Read();
+  /// Where something was mounted or unmounted, as far as the Reads since the last call have seen it.
+  std::set<std::string> TakeChanged() { return std::exchange(changed_, {}); }
 
   /// Without an entry when there is none of that id.
   Mount Find(uint64_t id) const;
@@ -40,10 +44,14 @@ class MountTable {
     std::string point;
     bool is_network = false;
   };
+  using Lines = std::map<uint64_t, Line>;
+
+  void NoteMissing(const Lines& lines, const Lines& others);
 
   std::string path_;
   UniqueFd fd_;
-  std::map<uint64_t, Line> lines_;
+  Lines lines_;
+  std::set<std::string> changed_;
 };
 
 }  // namespace ferrox::notifyd

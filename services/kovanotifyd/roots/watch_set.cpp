@@ -124,6 +124,25 @@ void WatchSet::Examine() {
   };
   ChangeRoots(WatchRoots(registrations_, is_on_one_mount));
   for (auto& [path, root] : roots_) ExamineRoot(root, disturbed.count(path) != 0);
+  for (const std::string& point : mounts_.TakeChanged()) OnMountChanged(point);
+}
+
+/// What is mounted below a folder hides what is there, which comes to light again afterwards. A registered folder there
+/// is looked at as such, since it may lie on the volume that went.
+void WatchSet::OnMountChanged(const std::string& point) {
+  for (const Registration& registration : registrations_) {
+    for (const QueueWatch& watch : registration.watches) {
+      if (IsAtOrBelow(watch.path, point)) return;
+    }
+  }
+  bool is_below = false;
+  for (auto& [path, root] : roots_) {
+    if (root.state == Root::State::kWaiting || !IsAtOrBelow(point, path)) continue;
+    is_below = true;
+    const bool is_anew = !IsScanned(root) && ways_[root.way].watcher->WatchesEachFolder();
+    if (is_anew) ExamineRoot(root, true);
+  }
+  if (is_below) listener_.OnCompare(point);
 }
 
 /// A folder whose server may not answer is taken for what it is said to be.

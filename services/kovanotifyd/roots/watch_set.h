@@ -97,6 +97,7 @@ class WatchSet {
 
   FolderLook Look(const std::string& path) const;
   void ChangeRoots(const std::vector<WatchRoot>& roots);
+  void OnMountChanged(const std::string& point);
   void ExamineRoot(Root& root, bool is_disturbed);
   void Begin(Root& root, const FolderLook& look);
   void Stop(Root& root);
