@@ -1,6 +1,8 @@
 #include <algorithm>
 #include <cerrno>
 #include <cstdio>
+#include <set>
+#include <string>
 
 #include "cli/ask.h"
 #include "cli/command_table.h"
@@ -98,6 +100,27 @@ void IndexWholeShare(const std::string& name, bool added) {
   }
 }
 
+/// Which shares have a part of its files, and of whose files it has a part now: a file is in the deepest share alone.
+void TellOfNested(const kova::host::ShareEntry& added) {
+  const std::set<std::string> indexed = fileindex::FolderMgr().GetIndexedShares();
+  if (indexed.count(added.name) == 0) return;
+  std::string outer;
+  size_t depth = 0;
+  for (const auto& share : kova::host::ListShares()) {
+    if (indexed.count(share.name) == 0) continue;
+    if (StringStartWith(share.path, added.path + "/")) {
+      (void)printf("share %s lies in it and keeps its files, which are found there alone\n",
+                   EscapeForTerminal(share.name).c_str());
+    } else if (StringStartWith(added.path, share.path + "/") && share.path.size() > depth) {
+      outer = share.name;
+      depth = share.path.size();
+    }
+  }
+  if (outer.empty()) return;
+  (void)printf("it lies in share %s, which leaves it out: its files are found in share %s alone\n",
+               EscapeForTerminal(outer).c_str(), EscapeForTerminal(added.name).c_str());
+}
+
 }  // namespace
 
 int RunShareAdd(const Arguments& arguments) {
@@ -111,6 +134,7 @@ int RunShareAdd(const Arguments& arguments) {
   if (index) IndexWholeShare(entry.name, !known);
   (void)printf("share %s: %s%s%s\n", EscapeForTerminal(entry.name).c_str(), EscapeForTerminal(entry.path).c_str(),
                known ? " (a share already)" : "", index ? ", all of it is indexed" : "");
+  TellOfNested(entry);
   return kDone;
 }
 

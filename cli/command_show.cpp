@@ -162,6 +162,26 @@ uint64_t ListUnread(const std::string& share, bool json) {
   }
 }
 
+/// Folders of the share that are no part of its index, unless another share has them. Nothing when no daemon tells.
+uint64_t ListLeftOut(const Json::Value& daemon, const std::string& share, bool json) {
+  uint64_t count = 0;
+  if (!daemon.isObject()) return count;
+  for (const Json::Value& entry : daemon["shares"]) {
+    if (TextOf(entry, "share") != share) continue;
+    for (const Json::Value& folder : entry["left_out"]) {
+      if (folder.isMember("share")) continue;
+      ++count;
+      if (json) {
+        (void)printf("%s\n", ToScriptJson(folder).c_str());
+      } else {
+        (void)printf("%s\n    left out with all in it: %s\n", EscapeForTerminal(TextOf(folder, "path")).c_str(),
+                     EscapeForTerminal(TextOf(folder, "reason")).c_str());
+      }
+    }
+  }
+  return count;
+}
+
 }  // namespace
 
 int RunShow(const Arguments& arguments) {
@@ -175,12 +195,16 @@ int RunShow(const Arguments& arguments) {
 
 int RunUnread(const Arguments& arguments) {
   uint64_t count = 0;
+  uint64_t folders = 0;
   LeftOut left_out;
+  const Json::Value daemon = AskIndexDaemonIfRunning("status", Json::Value());
   for (const std::string& share : IndexedShares(arguments.words)) {
     (void)left_out.Unless(share, [&] { count += ListUnread(share, arguments.Has("--json")); });
+    folders += ListLeftOut(daemon, share, arguments.Has("--json"));
   }
   if (fflush(stdout) != 0) throw Failure("standard output cannot be written");
   (void)fprintf(stderr, "%s files could not be read, or not all of them\n", Count(count).c_str());
+  if (folders != 0) (void)fprintf(stderr, "%s folders are left out\n", Count(folders).c_str());
   left_out.Tell();
   return left_out.Empty() ? kDone : kIncomplete;
 }

@@ -62,6 +62,10 @@ void PrintShare(const Json::Value& share, const std::string& notification_proble
     PrintReasons("indexed by name only", index["extract_errors"], index["extract_error_examples"]);
     if (!index["extract_errors"].empty()) (void)printf("      all: fileindexctl unread %s\n", name.c_str());
   }
+  for (const Json::Value& folder : share["left_out"]) {
+    (void)printf("    left out: %s: %s\n", EscapeForTerminal(TextOf(folder, "path")).c_str(),
+                 EscapeForTerminal(TextOf(folder, "reason")).c_str());
+  }
   Json::Value counts(Json::objectValue);
   Json::Value examples(Json::objectValue);
   for (const auto& reason : share["failures"].getMemberNames()) {

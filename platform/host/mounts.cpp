@@ -7,6 +7,8 @@
 #include <cstdio>
 #include <cstdlib>
 #include <fstream>
+#include <set>
+#include <sstream>
 
 #include "platform/host/files.h"
 
@@ -33,6 +35,20 @@ bool GetKey(const std::string& path, MountKey& key) {
 #endif
   key.device = std::to_string(info.stx_dev_major) + ":" + std::to_string(info.stx_dev_minor);
   return true;
+}
+
+/// Blanks, tabs, newlines and backslashes stand as "\040" and so on.
+std::string Unescape(const std::string& text) {
+  std::string plain;
+  for (size_t i = 0; i < text.size(); ++i) {
+    if (text[i] == '\\' && i + 3 < text.size()) {
+      plain += static_cast<char>((text[i + 1] - '0') * 64 + (text[i + 2] - '0') * 8 + (text[i + 3] - '0'));
+      i += 3;
+    } else {
+      plain += text[i];
+    }
+  }
+  return plain;
 }
 
 /// The type in one line: "36 35 98:0 /root /mount/point options [more]... - ext4 source options".
@@ -76,6 +92,20 @@ int IsMountRoot(const std::string& path) {
 std::string MountPointOf(std::string path) {
   while (path.size() > 1 && IsMountRoot(path) != 1) path = FolderOf(path);
   return path;
+}
+
+std::vector<std::string> MountsBelow(const std::string& folder) {
+  const std::string prefix = folder == "/" ? folder : folder + "/";
+  std::set<std::string> points;
+  std::ifstream table("/proc/self/mountinfo");
+  for (std::string line; std::getline(table, line);) {
+    std::istringstream fields(line);
+    std::string id, parent, device, root, point;
+    if (!(fields >> id >> parent >> device >> root >> point)) continue;
+    point = Unescape(point);
+    if (point.size() > prefix.size() && point.compare(0, prefix.size(), prefix) == 0) points.insert(point);
+  }
+  return {points.begin(), points.end()};
 }
 
 }  // namespace kova::host

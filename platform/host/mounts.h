@@ -1,6 +1,7 @@
 #pragma once
 
 #include <string>
+#include <vector>
 
 namespace kova::host {
 
@@ -13,5 +14,8 @@ int IsMountRoot(const std::string& path);
 
 /// The deepest mount point at or above a path without links, whether or not the path is there.
 std::string MountPointOf(std::string path);
+
+/// Where something is mounted below (not at) a folder, in ascending order; nothing is looked at but the mount table.
+std::vector<std::string> MountsBelow(const std::string& folder);
 
 }  // namespace kova::host

@@ -53,7 +53,7 @@ void FileCount::Count(const std::string& folder) {
     const DirPtr dir = OpenFolder(path, device);
     if (!dir) continue;
     if (first) root_device = device;
-    if (device != root_device) continue;
+    if (device != root_device || folders_.IsInInner(path)) continue;
     const bool indexed = folders_.PlaceOf(path) == Place::kIndexed;
     while (const dirent* entry = readdir(dir.get())) {
       const std::string name = entry->d_name;

@@ -31,6 +31,7 @@ class IndexDaemon {
     /// Files that change when shares do; without them that is noticed at intervals.
     std::vector<std::string> share_files = {};
     IsMountPoint is_mount_point = &NothingMounted;
+    MountsBelow mounts_below = &NoMounts;
   };
 
   explicit IndexDaemon(const Options& options);

@@ -53,6 +53,7 @@ int main(int argc, char** argv) try {
   ferrox::services::Daemon daemon("fileindexd");
   options.share_files = {kova::host::ShareTablePath()};
   options.is_mount_point = &kova::host::IsMountRoot;
+  options.mounts_below = &kova::host::MountsBelow;
   ferrox::indexd::IndexDaemon index_daemon(options);
   ferrox::services::FrameServerOptions server_options;
   server_options.socket_path = ferrox::InstancePath(ferrox::kFileIndexdSocket);

@@ -109,6 +109,9 @@ void OperationRunner::CarryOut(const fileindex::OP& op, Stage stage) {
     if (stage == Stage::kLook && op.op == fileindex::OP_RENAME) CompareOnce(op.path);
     return;
   }
+  // Whoever watches this share is told of what happens in those that lie in it, too.
+  const bool is_inner = context_.folders.IsInInner(path);
+  if (is_inner && (op.op != fileindex::OP_RENAME || context_.folders.IsInInner(op.path))) return;
   for (const Handler& handler : kHandlers) {
     const Handler::Function function = stage == Stage::kMove ? handler.move : handler.look;
     if (handler.op == op.op && function != nullptr) (this->*function)(path, op.path);

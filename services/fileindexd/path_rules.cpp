@@ -74,6 +74,7 @@ bool PathRules::FolderIsLeftOut(const std::string& folder) {
 }
 
 bool PathRules::MayEnter(const std::string& path, const struct stat& status, dev_t parent_device) const {
+  if (folders_.IsInInner(path)) return false;
   const std::string name = Basename(path);
   const bool telling_name =
       name.find("#snapshot") != std::string::npos || name.find("#recycle") != std::string::npos || share_ == "homes";

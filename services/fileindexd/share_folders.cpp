@@ -1,5 +1,8 @@
 #include "services/fileindexd/share_folders.h"
 
+#include <algorithm>
+#include <set>
+
 #include <json/value.h>
 
 #include "common/error.h"
@@ -14,13 +17,32 @@ namespace ferrox::indexd {
 namespace {
 
 constexpr std::array<const char*, 4> kKindNames = {"document", "audio", "video", "photo"};
+constexpr char kInner[] = "inner";
+
+/// The indexed shares below a folder: their names, by their own folders.
+std::map<std::string, std::string, std::less<>> SharesBelow(const std::string& root,
+                                                            const fileindex::FolderMgr& folder_mgr) {
+  std::map<std::string, std::string, std::less<>> below;
+  const std::set<std::string> indexed = folder_mgr.GetIndexedShares();
+  for (const std::string& name : sdk::SDKShare::Enum()) {
+    if (indexed.count(name) == 0) continue;
+    const std::string path = sdk::SDKShare(name).GetPath();
+    if (StringStartWith(path, root + "/")) below[path] = name;
+  }
+  return below;
+}
 
 }  // namespace
 
 ShareFolders ShareFolders::FromJson(const Json::Value& stored) {
   ShareFolders folders;
   if (!IsJsonObject(stored)) throw Error(Error::kBadArgument, "not an object");
+  const Json::Value& inner = stored[kInner];
+  for (Json::ArrayIndex i = 0; inner.isArray() && i < inner.size(); ++i) {
+    if (inner[i].isString()) folders.inner_[inner[i].asString()] = "";
+  }
   for (const std::string& path : stored.getMemberNames()) {
+    if (path == kInner) continue;
     Kinds& kinds = folders.kinds_[path];
     for (size_t kind = 0; kind < kinds.size(); ++kind) {
       GetJsonValue(kinds[kind], stored[path], kKindNames[kind], true);
@@ -34,6 +56,7 @@ Json::Value ShareFolders::ToJson() const {
   for (const auto& [path, kinds] : kinds_) {
     for (size_t kind = 0; kind < kinds.size(); ++kind) stored[path][kKindNames[kind]] = kinds[kind];
   }
+  for (const auto& [path, name] : inner_) stored[kInner].append(path);
   return stored;
 }
 
@@ -49,6 +72,7 @@ ShareFolders ShareFolders::Load(const std::string& share, const std::string& roo
     (void)loaded.kinds_.emplace(root + path.substr(1 + share.size()),
                                 Kinds{folder->IsDocument(), folder->IsAudio(), folder->IsVideo(), folder->IsPhoto()});
   }
+  loaded.inner_ = SharesBelow(root, folder_mgr);
   return loaded;
 }
 
@@ -60,7 +84,22 @@ const ShareFolders::Kinds* ShareFolders::Governing(std::string_view full_path) c
   return nullptr;
 }
 
+/// The names do not matter.
+bool ShareFolders::SameInner(const ShareFolders& other) const {
+  return std::equal(inner_.begin(), inner_.end(), other.inner_.begin(), other.inner_.end(),
+                    [](const auto& ours, const auto& theirs) { return ours.first == theirs.first; });
+}
+
+bool ShareFolders::IsInInner(std::string_view full_path) const {
+  if (inner_.empty()) return false;
+  for (size_t end = full_path.size(); end != std::string_view::npos && end > 0; end = full_path.rfind('/', end - 1)) {
+    if (inner_.find(full_path.substr(0, end)) != inner_.end()) return true;
+  }
+  return false;
+}
+
 ShareFolders::Place ShareFolders::PlaceOf(std::string_view full_path) const {
+  if (IsInInner(full_path)) return Place::kOutside;
   if (Governing(full_path) != nullptr) return Place::kIndexed;
   const std::string below = std::string(full_path) + "/";
   const auto next = kinds_.lower_bound(below);
@@ -92,6 +131,11 @@ std::vector<std::string> ShareFolders::DifferingFrom(const ShareFolders& other) 
   }
   for (const auto& [path, kinds] : other.kinds_) {
     if (kinds_.find(path) == kinds_.end()) differing.push_back(path);
+  }
+  for (const auto* inner : {&inner_, &other.inner_}) {
+    for (const auto& [path, name] : *inner) {
+      if (inner_.count(path) != other.inner_.count(path)) differing.push_back(path);
+    }
   }
   return differing;
 }

@@ -13,12 +13,13 @@ namespace ferrox::indexd {
 
 /// The indexed folders of one share as they were configured at one moment: what decides, whatever the disk holds, which
 /// paths have a document and of which files the content is read. Of folders that lie in each other the deepest governs.
-/// Only the share's own folders count, also where another share lies in it. Whether the share has a recycle bin, which
+/// Only the share's own folders count, also where another share lies in it; one that is indexed itself owns all in it,
+/// and none of it counts here. Whether the share has a recycle bin, which
 /// is not indexed, is part of the configuration. Safe for several threads.
 class ShareFolders {
  public:
   enum class Place {
-    kOutside,   ///< under no folder
+    kOutside,   ///< under no folder, or in an indexed share that lies in this one
     kOnTheWay,  ///< under no folder, but one lies below
     kIndexed,   ///< a folder, or under one
   };
@@ -30,33 +31,42 @@ class ShareFolders {
   static ShareFolders Load(const std::string& share, const std::string& root);
   /// Back from ToJson. @throws Error kBadArgument for anything else.
   static ShareFolders FromJson(const Json::Value& stored);
-  /// An object with a member for each folder, by its full path: an object of the kinds. Nothing else is kept.
+  /// An object with a member for each folder, by its full path: an object of the kinds; and "inner", the folders of
+  /// the shares that lie in this one. Nothing else is kept.
   Json::Value ToJson() const;
 
   /// Whether the same is indexed, paused or not.
   bool operator==(const ShareFolders& other) const {
-    return kinds_ == other.kinds_ && recycle_bin_ == other.recycle_bin_;
+    return kinds_ == other.kinds_ && SameInner(other) && recycle_bin_ == other.recycle_bin_;
   }
   size_t Count() const { return kinds_.size(); }
   bool AnyPaused() const { return any_paused_; }
 
   Place PlaceOf(std::string_view full_path) const;
+  /// The indexed shares that lie in this one: their names, by their folders.
+  const std::map<std::string, std::string, std::less<>>& Inner() const { return inner_; }
+  /// Whether the path is, or lies in, the folder of one of them.
+  bool IsInInner(std::string_view full_path) const;
   /// Whether the content of a file there is read: its kind is on, or it is of none of the four kinds.
   bool WantsContent(const std::string& full_path) const;
   /// What is indexed of all at and below a path: itself, or the folders below it that lie in no other.
   std::vector<std::string> Topmost(const std::string& full_path) const;
-  /// The folders that only one of the two has, and those whose kinds differ.
+  /// The folders, and those of inner shares, that only one of the two has, and the folders whose kinds differ.
   std::vector<std::string> DifferingFrom(const ShareFolders& other) const;
+  /// Whether the inner shares are all that differs.
+  bool DiffersInInnerAlone(const ShareFolders& other) const { return kinds_ == other.kinds_ && !SameInner(other); }
 
  private:
   using Kinds = std::array<bool, 4>;  ///< in the order of fileindex::FileType
 
+  bool SameInner(const ShareFolders& other) const;
   /// The kinds under which the path lies; null when it is under no folder.
   const Kinds* Governing(std::string_view full_path) const;
 
   bool any_paused_ = false;
   bool recycle_bin_ = false;
-  std::map<std::string, Kinds, std::less<>> kinds_;  ///< by full path
+  std::map<std::string, Kinds, std::less<>> kinds_;        ///< by full path
+  std::map<std::string, std::string, std::less<>> inner_;  ///< names of shares by full path
 };
 
 }  // namespace ferrox::indexd

@@ -4,6 +4,7 @@
 
 #include <functional>
 #include <string>
+#include <vector>
 
 #include "common/unique_fd.h"
 
@@ -12,8 +13,12 @@ namespace ferrox::indexd {
 /// Whether something is mounted on a folder: 1, 0, or below 0 when that cannot be told.
 using IsMountPoint = std::function<int(const std::string& path)>;
 
+/// Where something is mounted below a folder, in ascending order.
+using MountsBelow = std::function<std::vector<std::string>(const std::string& folder)>;
+
 /// For those who know of none.
 inline int NothingMounted(const std::string&) { return 0; }
+inline std::vector<std::string> NoMounts(const std::string&) { return {}; }
 
 /// Where the nearest mount at or above a folder is; "" for the root file system.
 std::string MountPointOf(const std::string& folder, const IsMountPoint& is_mount_point);

@@ -40,6 +40,8 @@ using std::chrono::steady_clock;
 constexpr seconds kSlowTimer(30);
 constexpr seconds kSlowTimerWithoutWatch(2);
 constexpr milliseconds kEventPoll(200);
+/// Asks for nothing but a pass, which sees to what differs from the last one.
+constexpr int kPassEvent = 0;
 constexpr int kClearedByReindex = StatusMgr::kNeedReindex | StatusMgr::kSecondCondition;
 
 bool HasContent(const std::string& path) {
@@ -122,6 +124,15 @@ void ShareWorker::Wake() {
   watch_.Wake();
 }
 
+void ShareWorker::NoteInner(const std::vector<std::string>& folders) {
+  if (noted_inner_ == folders) return;
+  const bool is_change = noted_inner_.has_value();
+  noted_inner_ = folders;
+  if (!is_change) return;  // the first round sees it
+  ++inner_changes_;
+  Wake();
+}
+
 uint64_t ShareWorker::RequestSync() {
   if (NothingWaits()) return 0;
   const uint64_t request = progress_.Ask();
@@ -145,7 +156,9 @@ std::string ShareWorker::AwaitSync(uint64_t request, QueueProgress::TimePoint en
 
 /// In this order: what leaves the live queue is in the detached one until the index has it.
 bool ShareWorker::NothingWaits() const {
-  if (!settled_ || HasContent(queue_path_) || IsFileExist(queue_path_ + ".tmp")) return false;
+  if (!settled_ || inner_changes_ != inner_changes_seen_ || HasContent(queue_path_) ||
+      IsFileExist(queue_path_ + ".tmp"))
+    return false;
   try {
     return (StatusMgr().GetShareStatus(share_) & StatusMgr::kNeedReindex) == 0;
   } catch (const Error&) {
@@ -176,6 +189,7 @@ void ShareWorker::Loop() {
 
 milliseconds ShareWorker::Round() {
   settled_ = false;
+  inner_changes_seen_ = inner_changes_.load();
   serves_ = progress_.Asked();
   try {
     RunOnce();
@@ -290,9 +304,12 @@ void ShareWorker::RunOnce() {
   // Nobody may have noticed what became of it meanwhile.
   if (away_) (void)Queue(fileindex::EVENT_REINDEX, root_);
   away_ = false;
-  (void)LoadFolders();  // the status tells how many there are
+  const ShareFolders folders = LoadFolders();
   EnsureIndex();
   const std::string detached = queue_path_ + ".tmp";
+  // A pass looks at the folders of shares in this one that came or went; nobody queues anything for that.
+  const bool is_queued = HasContent(queue_path_) || IsFileExist(detached);
+  if (!is_queued && folders.DiffersInInnerAlone(applied_.Get())) (void)Queue(kPassEvent, root_);
   do {
     serves_ = progress_.Asked();
     QueueNeededReindex();
@@ -352,8 +369,10 @@ void ShareWorker::MakeMissingIndex() {
 /// Whether the index is not what the folders want, although the queue is empty. The event that tells of it may be yet
 /// to come. If it does not, its sender has died or could not tell, and it is queued here.
 bool ShareWorker::AwaitsEvent() {
-  const std::vector<std::string> differing = LoadFolders().DifferingFrom(applied_.Get());
+  const ShareFolders folders = LoadFolders();
+  const std::vector<std::string> differing = folders.DifferingFrom(applied_.Get());
   const bool strays = HoldsStrays();
+  if (!strays && folders.DiffersInInnerAlone(applied_.Get())) return true;  // since this round began
   if (!strays && differing.empty()) {
     awaits_since_.reset();
     return false;
@@ -446,7 +465,8 @@ void ShareWorker::RunOperations(fileindex::QueueMgr& queue, OperationRunner& run
 
 ShareFolders ShareWorker::LoadFolders() {
   ShareFolders folders = ShareFolders::Load(share_, root_);
-  folder_count_ = folders.Count();
+  const std::lock_guard lock(shown_mutex_);
+  shown_ = std::make_shared<const ShareFolders>(folders);
   return folders;
 }
 
@@ -465,11 +485,54 @@ bool ShareWorker::AreStill(const ShareFolders& folders) {
   }
 }
 
+std::shared_ptr<const ShareFolders> ShareWorker::Shown() {
+  const std::lock_guard lock(shown_mutex_);
+  return shown_;
+}
+
+/// An encrypted share is a mount of its own, and takes those below it for its own too.
+std::vector<std::string> ShareWorker::MountsLeftOut() const {
+  try {
+    return sdk::SDKShare(share_).IsEncryption() ? std::vector<std::string>{} : environment_.mounts_below(root_);
+  } catch (const Error&) {
+    return {};  // the share is gone
+  }
+}
+
+/// The folders under indexed ones that are not indexed here, for reasons that only the configuration and the mounts
+/// tell. Of those that lie in each other, the outermost.
+Json::Value ShareWorker::LeftOut(const ShareFolders& folders) const {
+  Json::Value list(Json::arrayValue);
+  std::string last;
+  const auto is_new = [&last](const std::string& path) {
+    if (!last.empty() && StringStartWith(path, last + "/")) return false;
+    last = path;
+    return true;
+  };
+  for (const auto& [path, share] : folders.Inner()) {
+    if (!is_new(path)) continue;
+    Json::Value& entry = list.append(Json::Value());
+    entry["path"] = path;
+    entry["share"] = share;
+    entry["reason"] = "its files are those of share " + share;
+  }
+  last.clear();
+  for (const std::string& point : MountsLeftOut()) {
+    if (folders.PlaceOf(point) == ShareFolders::Place::kOutside || !is_new(point)) continue;
+    Json::Value& entry = list.append(Json::Value());
+    entry["path"] = point;
+    entry["reason"] = "another file system is mounted there; 'fileindexctl share add' makes it a share of its own";
+  }
+  return list;
+}
+
 Json::Value ShareWorker::Status(std::chrono::milliseconds engine_wait) {
   Json::Value json = status_.ToJson();
   json["share"] = share_;
   json["path"] = root_;
-  json["folders"] = Json::UInt64(folder_count_);
+  const std::shared_ptr<const ShareFolders> folders = Shown();
+  json["folders"] = Json::UInt64(folders == nullptr ? 0 : folders->Count());
+  if (folders != nullptr) json["left_out"] = LeftOut(*folders);
   json["queue"] = queue_path_;
   // The worker may not have noticed yet that the pause is over.
   const bool pause_over = json["state"] == "paused" && !json.isMember("detail") && !environment_.pause.Paused();

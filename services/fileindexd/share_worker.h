@@ -5,10 +5,12 @@
 #include <cstdint>
 #include <functional>
 #include <memory>
+#include <mutex>
 #include <optional>
 #include <set>
 #include <string>
 #include <thread>
+#include <vector>
 
 #include <json/value.h>
 
@@ -60,6 +62,7 @@ class ShareWorker {
     /// What takes longer than this was not finished.
     std::chrono::milliseconds patience = std::chrono::seconds(5);
     IsMountPoint is_mount_point = &NothingMounted;
+    MountsBelow mounts_below = &NoMounts;
     /// A volume that is away is looked for so often.
     std::chrono::milliseconds volume_poll = std::chrono::seconds(2);
   };
@@ -79,6 +82,10 @@ class ShareWorker {
   void Forget();
   /// Looks again at the pause, the queue and the share's settings at once.
   void Wake();
+
+  /// Which indexed shares lie in this one now; what changes in that is carried out at once. From any thread, one at a
+  /// time.
+  void NoteInner(const std::vector<std::string>& folders);
 
   /// Asks that all that is queued now be in the index soon. @return what AwaitSync waits for; 0 when nothing is to be
   /// done. Like AwaitSync, from any thread.
@@ -125,6 +132,9 @@ class ShareWorker {
   void RunOperations(fileindex::QueueMgr& queue, OperationRunner& runner, const ShareFolders& folders,
                      bool whole_share);
   ShareFolders LoadFolders();
+  std::shared_ptr<const ShareFolders> Shown();
+  std::vector<std::string> MountsLeftOut() const;
+  Json::Value LeftOut(const ShareFolders& folders) const;
   bool AreStill(const ShareFolders& folders);
   void QueueAgainIfChanged(const OperationRunner& runner, const ShareFolders& folders);
 
@@ -138,7 +148,11 @@ class ShareWorker {
   AppliedFolders applied_;
   std::optional<std::chrono::steady_clock::time_point> awaits_since_;
   std::set<std::string> written_ahead_;
-  std::atomic<uint64_t> folder_count_{0};
+  std::mutex shown_mutex_;
+  std::shared_ptr<const ShareFolders> shown_;            ///< those last loaded, for the status
+  std::optional<std::vector<std::string>> noted_inner_;  ///< NoteInner's own
+  std::atomic<uint64_t> inner_changes_{0};
+  std::atomic<uint64_t> inner_changes_seen_{0};  ///< when the present or last round began
   int last_failure_ = 0;
   std::chrono::steady_clock::time_point failing_since_;  ///< with that failure
   std::chrono::steady_clock::time_point last_pass_end_;

@@ -7,6 +7,7 @@
 #include <set>
 
 #include "common/error.h"
+#include "common/file_util.h"
 #include "common/log.h"
 #include "fileindex/folder_mgr.h"
 #include "sdk/share.h"
@@ -141,6 +142,13 @@ void WorkerSet::ReconcileLocked() {
     } catch (const Error& error) {
       Log(LOG_ERR, "share %s gets no worker for now: %s", share.c_str(), error.what());
     }
+  }
+  for (const auto& [share, worker] : workers_) {
+    std::vector<std::string> inner;
+    for (const auto& [name, other] : indexed_shares) {
+      if (StringStartWith(other.root, worker->Root() + "/")) inner.push_back(other.root);
+    }
+    worker->NoteInner(inner);
   }
 }
 

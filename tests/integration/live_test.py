@@ -15,7 +15,7 @@ import time
 import unittest
 
 from instance import RENAME, differences, wait_for, write
-from live import WAYS, LiveInstance
+from live import WAYS, LiveInstance, disk
 
 NOBODY = 65534
 
@@ -339,6 +339,98 @@ class LiveTest(unittest.TestCase):
                     with contextlib.suppress(FileNotFoundError):
                         os.remove(gone)
         self.assertEqual(0, self.instance.notifyd()["lost"])
+
+    # What lies below a share and is not its own.
+
+    def check_mounts(self, way):
+        self.instance.watch_by(way, scan_interval=3600)
+        docs, = self.up("docs")
+        if self.instance.watches()[docs]["watch"] != way:
+            self.skipTest(f"no {way} here")
+        point = f"{docs}/sub/point"
+        write(f"{point}/hidden.txt", "hidden")
+        write(f"{docs}/sub/a.txt", "adder")
+        self.expect_index_is_disk()
+        for turn in range(3):
+            self.mount("-t", "tmpfs", "none", point)
+            if turn == 2:  # watched for the first time while it is hidden
+                self.instance.kill("kovanotifyd")
+                self.instance.ctl("up")
+            write(f"{point}/on_volume.txt", "mounted")
+            self.assertEqual([], self.instance.sync())
+            self.assertEqual({f"{docs}/sub", f"{docs}/sub/a.txt"}, set(self.instance.indexed("docs")))
+            for words in (["status"], ["unread"], ["unread", "--json"]):
+                told = self.instance.ctl(*words).decode()
+                self.assertRegex(told, rf"(?s){point}\W.*another file system is mounted there", words)
+            self.assertEqual(0, subprocess.run(["umount", point], check=False).returncode)
+            self.expect_index_is_disk(f"unmounted, turn {turn}")
+            self.assertNotIn("mounted there", self.instance.ctl("status").decode())
+            write(f"{point}/hidden.txt", f"to light again {turn}")
+            self.expect_index_is_disk(f"written, turn {turn}")
+
+    def test_mounts_below_a_share_by_fanotify(self):
+        self.check_mounts("fanotify")
+
+    def test_mounts_below_a_share_by_inotify(self):
+        self.check_mounts("inotify")
+
+    def test_a_file_is_in_the_deepest_share_alone(self):
+        self.instance.ctl("up")
+        outer = f"{self.scratch()}/outer"
+        inner, deep = f"{outer}/inner", f"{outer}/inner/below/deep"
+        for number in range(20):
+            write(f"{outer}/o{number}.txt", "osprey")
+            write(f"{inner}/i{number}.txt", "ibis")
+            write(f"{deep}/d{number}.txt", "duck")
+
+        def expect(paused="", **shares):
+            self.instance.sync()
+            for name, folder in shares.items():
+                owners = sorted([paused, *shares.values()])
+                within = next((other for other in owners if other.startswith(folder + "/")), "none")
+                want = {path for path in disk(folder) if not (path + "/").startswith(within + "/")}
+                self.assertEqual(want, set(self.instance.indexed(name)), name)
+                self.assertEqual([within][:within != "none"], [entry["path"] for entry in
+                                                               self.instance.share_status(name)["left_out"]])
+
+        def add(folder, *words):
+            name = os.path.basename(folder)
+            self.instance.shares[name] = folder
+            return self.instance.ctl("share", "add", folder, *words).decode()
+
+        def outer_wrote():
+            return self.instance.share_status("outer")["written"]
+        add(inner)  # first the inner one
+        self.assertIn("share inner lies in it", add(outer))
+        expect(outer=outer, inner=inner)
+        before = outer_wrote()
+        self.assertIn("it lies in share inner, which leaves it out", add(deep))
+        expect(outer=outer, inner=inner, deep=deep)
+        self.assertEqual(20, len(self.instance.search("--fresh", "duck")))
+        self.assertIn("its files are those of share deep", self.instance.ctl("status").decode())
+        write(f"{deep}/new.txt", "duck")
+        os.rename(f"{outer}/o1.txt", f"{inner}/o1.txt")
+        os.rename(f"{deep}/d1.txt", f"{outer}/d1.txt")
+        expect(outer=outer, inner=inner, deep=deep)
+        self.instance.ctl("share", "pause", "deep")  # still the owner
+        before = outer_wrote()
+        del self.instance.shares["deep"]
+        expect(deep, outer=outer, inner=inner)
+        self.instance.ctl("share", "resume", "deep")
+        self.instance.shares["deep"] = deep
+        self.instance.ctl("share", "rename", "deep", "deeper")
+        deep = f"{inner}/below/deeper"
+        self.instance.shares = {"outer": outer, "inner": inner, "deeper": deep}
+        expect(outer=outer, inner=inner, deeper=deep)
+        del self.instance.shares["inner"]
+        self.instance.ctl("share", "remove", "inner")
+        expect(outer=outer, deeper=deep)
+        self.assertLessEqual(outer_wrote() - before, 25, "what came to it alone is read")
+        self.assertEqual(21, len(self.instance.search("--fresh", "duck")))
+        del self.instance.shares["deeper"]
+        self.instance.ctl("share", "remove", "deeper")
+        expect(outer=outer)
+        self.assertIn("already", add(outer))
 
     def test_idle_instance_does_nothing(self):
         if os.geteuid() == 0:  # a file system of its own, since a mark on one tells of all that happens there
