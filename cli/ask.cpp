@@ -166,6 +166,12 @@ InstanceState AskAll() {
   return state;
 }
 
+std::string NotNoticed() {
+  if (services::IsServed(InstancePath(kNotifydSocket))) return {};
+  return "the notification daemon does not run, so that what has changed since may be missing; start it with "
+         "'fileindexctl up'";
+}
+
 /// First what the file systems have reported is in the queues, then what is in the queues is in the index. Only where
 /// that cannot be said of all shares together, each is asked for by itself.
 std::map<std::string, std::string> AwaitChanges(const std::vector<std::string>& shares, std::chrono::seconds longest) {

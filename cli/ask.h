@@ -33,6 +33,9 @@ struct InstanceState {
 /// @throws NotPermitted.
 InstanceState AskAll();
 
+/// Why changes are not noticed now, so that the index may be behind; empty when the notification daemon runs.
+std::string NotNoticed();
+
 /// Waits until what was changed before in the shares (none named: in all that are worked on) is in the index. @return
 /// the shares of which that cannot be said, each with reason and remedy.
 /// @throws Failure, with reason and remedy, when it can be said of none of them.

@@ -188,6 +188,8 @@ int RunSearch(const Arguments& arguments) {
   if (arguments.Has("--fresh") && !IsFresh(arguments, scope)) return kIncomplete;
   Json::Value result = SearchIn(arguments, scope);
   result["left_out"] = scope.left_out.ToJson();
+  const std::string not_noticed = NotNoticed();
+  if (!not_noticed.empty()) result["not_noticed"] = not_noticed;
   const uint64_t hits = result["hits"].isArray() ? result["hits"].size() : 0;
   if (arguments.Has("--json")) {
     (void)printf("%s\n", ToScriptJson(result).c_str());
@@ -199,6 +201,7 @@ int RunSearch(const Arguments& arguments) {
     PrintNothingFound(result, scope);
   }
   (void)fflush(stdout);
+  if (!not_noticed.empty()) (void)fprintf(stderr, "fileindexctl: %s\n", not_noticed.c_str());
   scope.left_out.Tell();
   const bool partial = arguments.Has("--partial");
   if (scope.stale && !partial) (void)fprintf(stderr, "%s\n", kWithoutFresh);

@@ -36,9 +36,28 @@ constexpr Service kServices[] = {
     {"pkg-Ferrox-fileindexd", "index daemon", &KLIBServicectlStart, &KLIBServicectlStop, KLIB_SERVICECTL_UPSTART},
 };
 
+constexpr Service kSupervisor = {"fileindex-supervisor", "supervisor", nullptr, nullptr, 0};
+
 [[noreturn]] void ThrowProblem(const Service& service, const char* what) {
   const std::string reason = kova::host::LastServiceProblem();
   throw Failure(std::string("the ") + service.label + " could not be " + what + (reason.empty() ? "" : ": " + reason));
+}
+
+void TellSupervisor(const char* what) { (void)printf("%s: %s\n", kSupervisor.label, what); }
+
+/// systemd does it itself.
+void StartSupervisor() {
+  if (kova::host::HasServiceManager()) return;
+  const bool ran = kova::host::ChildServicePid(kova::host::kSupervisor) != 0;
+  if (kova::host::StartChildService(kova::host::kSupervisor) < 0) ThrowProblem(kSupervisor, "started");
+  TellSupervisor(ran ? "runs already" : "started");
+}
+
+void StopSupervisor() {
+  if (kova::host::HasServiceManager()) return;
+  const bool ran = kova::host::ChildServicePid(kova::host::kSupervisor) != 0;
+  if (kova::host::StopChildService(kova::host::kSupervisor) < 0) ThrowProblem(kSupervisor, "stopped");
+  if (ran) TellSupervisor("stopped");
 }
 
 /// A daemon that could not be told takes the pause from the status file when it starts.
@@ -56,17 +75,20 @@ int ReportPause(void (*change)(int hours), int hours, const std::string& report)
 
 }  // namespace
 
-int RunUp(const Arguments&) {
+int RunUp(const Arguments& arguments) {
   services::GuardLockFiles();
+  if (arguments.Has("--no-supervisor")) StopSupervisor();
   for (const Service& service : kServices) {
     const bool ran = KLIBServiceIsRunning(service.name) == 1;
     if (service.start(service.name, service.option) < 0) ThrowProblem(service, "started");
     (void)printf("%s: %s\n", service.label, ran ? "runs already" : "started");
   }
+  if (!arguments.Has("--no-supervisor")) StartSupervisor();
   return kDone;
 }
 
 int RunDown(const Arguments&) {
+  StopSupervisor();  // first, or it would start them again
   for (size_t i = std::size(kServices); i-- > 0;) {
     const Service& service = kServices[i];
     const bool ran = KLIBServiceIsRunning(service.name) == 1;

@@ -10,6 +10,7 @@
 #include "cli/watching.h"
 #include "common/clock.h"
 #include "fileindex/folder_mgr.h"
+#include "platform/host/child_service.h"
 
 namespace ferrox::cli {
 
@@ -149,6 +150,27 @@ std::string ContentExtractionText(const Json::Value& daemon) {
   return text;
 }
 
+/// Null where there is none, and systemd does its work.
+Json::Value SupervisorJson() {
+  Json::Value json;
+  const pid_t pid = kova::host::ChildServicePid(kova::host::kSupervisor);
+  if (kova::host::HasServiceManager()) json["program"] = "systemd";
+  if (!kova::host::HasServiceManager() && pid != 0) {
+    json["program"] = kova::host::kSupervisor.program;
+    json["pid"] = pid;
+  }
+  return json;
+}
+
+void PrintSupervisor() {
+  const Json::Value supervisor = SupervisorJson();
+  if (TextOf(supervisor, "program") == "systemd") return;
+  const std::string text = supervisor.isNull()
+                               ? "does not run: a daemon that is killed stays down; start it with 'fileindexctl up'"
+                               : "runs, process " + std::to_string(IntOf(supervisor, "pid"));
+  (void)printf("supervisor: %s\n", text.c_str());
+}
+
 /// `needed`: folders are indexed, which takes more than the engine. Content extraction starts by itself.
 int ExitCodeOf(const InstanceState& state, bool needed) {
   const bool stopped = needed && (state.index_daemon.status.isNull() || state.notification_daemon.status.isNull());
@@ -178,6 +200,7 @@ int RunStatus(const Arguments& arguments) {
     json["index_daemon"] = StatusJson(state.index_daemon);
     json["notification_daemon"] = StatusJson(state.notification_daemon);
     json["content_extraction"] = StatusJson(state.content_extraction);
+    json["supervisor"] = SupervisorJson();
     json["resting_shares"] = resting;
     if (!problem.empty()) json["problem"] = problem;
     (void)printf("%s\n", ToScriptJson(json).c_str());
@@ -188,6 +211,7 @@ int RunStatus(const Arguments& arguments) {
   PrintDaemon("notification daemon", state.notification_daemon,
               NotificationDaemonText(notification_daemon, needed || !problem.empty()));
   PrintDaemon("content extraction", state.content_extraction, ContentExtractionText(state.content_extraction.status));
+  PrintSupervisor();
   if (!problem.empty()) (void)printf("indexed folders: %s\n", EscapeForTerminal(problem).c_str());
   if (!daemon.isNull()) {
     const bool hangs = !state.notification_daemon.problem.empty();

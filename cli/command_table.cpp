@@ -13,7 +13,7 @@ CommandGroup Services() {
           {
               {"up",
                "",
-               {},
+               {{"--no-supervisor", nullptr, "leave nothing that starts them again when they are killed"}},
                "Starts the search engine, the notification daemon and the index daemon, and waits until they answer.",
                &RunUp,
                Needs::kInstance},

@@ -137,7 +137,8 @@ std::string LockHolderText(const std::string& path) {
 bool IsEnding(pid_t pid) {
   const std::string status = "\n" + ReadWhole(ProcessFolder(pid) + "/status");
   const std::string state = StatusField(status, "State");
-  if (state.empty() || state.front() == 'Z' || state.front() == 'X') return true;
+  if (state.empty()) return kill(pid, 0) != 0 && errno == ESRCH;  // others' may be hidden
+  if (state.front() == 'Z' || state.front() == 'X') return true;
   if (StatusField(status, "CoreDumping") == "1") return true;
   const uint64_t killed = UINT64_C(1) << (SIGKILL - 1);
   return ((strtoull(StatusField(status, "ShdPnd").c_str(), nullptr, 16) |

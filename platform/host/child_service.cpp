@@ -142,6 +142,12 @@ int Ended(const ServiceRow& service, std::streamoff log_from) {
                                              (last.empty() ? "" : ": " + last) + " (its log is " + log_path + ")");
 }
 
+int DoesNotAnswer(const ServiceRow& service) {
+  return ServiceFailure(KOVA_ERR_SYSTEM, std::string(service.program) + " runs but does not answer after " +
+                                             std::to_string(kStartMax.count()) + " s; see its log " +
+                                             ServiceLogPath(service.program));
+}
+
 /// Waits until the service is up. `pid` is the process that is to become it; what it logs begins at byte `log_from`.
 int WaitUntilReady(const ServiceRow& service, pid_t pid, std::streamoff log_from) {
   const ProcessHandle process(pid);
@@ -150,9 +156,41 @@ int WaitUntilReady(const ServiceRow& service, pid_t pid, std::streamoff log_from
     if (RunningPid(service) != 0 && Answers(service)) return 0;
     if (process.WaitForEnd(kPollMs)) return RunningPid(service) != 0 && Answers(service) ? 0 : Ended(service, log_from);
   } while (SteadyClock::now() < deadline);
-  return ServiceFailure(KOVA_ERR_SYSTEM, std::string(service.program) + " runs but does not answer after " +
-                                             std::to_string(kStartMax.count()) + " s; see its log " +
-                                             ServiceLogPath(service.program));
+  return DoesNotAnswer(service);
+}
+
+enum class Found { kAnswers, kMute, kGone };
+
+/// Of a process that has the pid file already: it may be just beginning or ending. One that was killed keeps the file,
+/// and even a socket that takes connections, until the last of its threads is gone.
+Found WaitForRunning(const ServiceRow& service, pid_t pid) {
+  const ProcessHandle process(pid);
+  const auto deadline = SteadyClock::now() + kStartMax;
+  while (RunningPid(service) == pid) {
+    if (!IsEnding(pid) && Answers(service) && !IsEnding(pid)) return Found::kAnswers;
+    if (SteadyClock::now() > deadline) return Found::kMute;
+    (void)process.WaitForEnd(kPollMs);
+  }
+  return Found::kGone;
+}
+
+/// Under the lock that a start needs.
+int StartLocked(const ServiceRow& service, const std::string& program) {
+  for (pid_t pid = RunningPid(service); pid != 0; pid = RunningPid(service)) {
+    const Found found = WaitForRunning(service, pid);
+    if (found != Found::kGone) return found == Found::kAnswers ? 0 : DoesNotAnswer(service);
+  }
+  const std::string log_path = ServiceLogPath(service.program);
+  const std::streamoff log_from = FileSize(log_path);
+  const pid_t pid = StartDetached(program, log_path);
+  if (pid < 0) return ServiceFailure(KOVA_ERR_SYSTEM, "cannot run " + program + ": " + strerror(errno));
+  return WaitUntilReady(service, pid, log_from);
+}
+
+/// What was stopped is not taken for dead, however it ended.
+void EmptyPidFile(const ServiceRow& service) {
+  const Fd file(open(PidPath(service).c_str(), O_WRONLY | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK));
+  if (file.Valid() && flock(file.Get(), LOCK_EX | LOCK_NB) == 0) (void)!ftruncate(file.Get(), 0);
 }
 
 bool WaitUntilGone(const ServiceRow& service, pid_t pid, std::chrono::seconds longest) {
@@ -186,9 +224,19 @@ int ServiceFailure(int code, const std::string& problem) {
 
 std::string ServiceLogPath(const std::string& program) { return InstanceRoot() + "/var/log/kova/" + program + ".log"; }
 
-bool IsChildServiceRunning(const ServiceRow& service) { return RunningPid(service) != 0; }
+pid_t ChildServicePid(const ServiceRow& service) {
+  const pid_t pid = RunningPid(service);
+  return pid != 0 && !IsEnding(pid) ? pid : 0;
+}
 
-int StartChildService(const ServiceRow& service) {
+bool HasChildServiceDied(const ServiceRow& service) {
+  const Fd file(open(PidPath(service).c_str(), O_RDONLY | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK));
+  return file.Valid() && ReadPid(file.Get()) != 0 && ChildServicePid(service) == 0;
+}
+
+namespace {
+
+int StartIf(const ServiceRow& service, bool (*wanted)(const ServiceRow&)) {
   const std::string program = FindProgram(service.program);
   if (program.empty()) {
     return ServiceFailure(KOVA_ERR_NOT_SUPPORTED, std::string(service.program) +
@@ -198,23 +246,28 @@ int StartChildService(const ServiceRow& service) {
   (void)MakeFolders(InstanceRoot() + "/var/run", 0755);  // a failure shows as that of the lock
   SwitchLock lock(service);
   if (Prepare(service, lock) < 0) return -1;
-  const std::string log_path = ServiceLogPath(service.program);
-  const std::streamoff log_from = FileSize(log_path);
-  pid_t pid = RunningPid(service);
-  if (pid == 0) pid = StartDetached(program, log_path);
-  if (pid < 0) return ServiceFailure(KOVA_ERR_SYSTEM, "cannot run " + program + ": " + strerror(errno));
-  return WaitUntilReady(service, pid, log_from);
+  return wanted(service) ? StartLocked(service, program) : 0;
 }
+
+}  // namespace
+
+int StartChildService(const ServiceRow& service) {
+  return StartIf(service, [](const ServiceRow&) { return true; });
+}
+
+int ReviveChildService(const ServiceRow& service) { return StartIf(service, &HasChildServiceDied); }
 
 int StopChildService(const ServiceRow& service) {
   if (RunningPid(service) == 0 && access(PidPath(service).c_str(), F_OK) != 0) return 0;
   SwitchLock lock(service);
   if (Prepare(service, lock) < 0) return -1;
   const pid_t pid = RunningPid(service);
-  if (pid == 0) return 0;
   const ProcessHandle process(pid);
   // The process is looked at again behind its handle: from here on nobody else can have its number.
-  if (RunningPid(service) != pid) return 0;
+  if (pid == 0 || RunningPid(service) != pid) {
+    EmptyPidFile(service);
+    return 0;
+  }
   if (!process.Signal(SIGTERM) && errno != ESRCH) {
     return ServiceFailure(KOVA_ERR_SYSTEM, std::string(service.program) + " (process " + std::to_string(pid) +
                                                ") cannot be told to stop: " + strerror(errno));
@@ -225,6 +278,7 @@ int StopChildService(const ServiceRow& service) {
   if (WaitUntilGone(service, pid, kKillMax)) {
     // It lets go of its pid file shortly before its end.
     (void)process.WaitForEnd(static_cast<int>(std::chrono::milliseconds(kKillMax).count()));
+    EmptyPidFile(service);
     return 0;
   }
   return ServiceFailure(KOVA_ERR_SYSTEM, std::string(service.program) + " does not end");

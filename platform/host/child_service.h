@@ -1,5 +1,8 @@
 #pragma once
 
+#include <sys/types.h>
+
+#include <span>
 #include <string>
 
 /// An instance's services without a service manager: processes that hold a lock on their pid file
@@ -15,11 +18,25 @@ struct ServiceRow {
   const char* unit;     ///< its unit under systemd
 };
 
+/// What starts the others again when they end without having been stopped; "fileindexctl up" starts it.
+inline constexpr ServiceRow kSupervisor = {"fileindex-supervisor", "fileindex-supervisor", nullptr, nullptr};
+
+/// The services of an instance.
+std::span<const ServiceRow> ChildServices();
+/// Whether systemd runs them instead.
+bool HasServiceManager();
+
 /// Start and stop wait until it has happened, and do nothing when it was so already. 0, or below 0 with the failure
 /// recorded and LastServiceProblem telling more.
 int StartChildService(const ServiceRow& service);
 int StopChildService(const ServiceRow& service);
-bool IsChildServiceRunning(const ServiceRow& service);
+/// The service's process, or 0. One that has been killed is none, although it may not be gone yet.
+pid_t ChildServicePid(const ServiceRow& service);
+
+/// Whether it has ended without having been stopped: its pid file, which an end in order empties, is not empty.
+bool HasChildServiceDied(const ServiceRow& service);
+/// Starts it if it has died.
+int ReviveChildService(const ServiceRow& service);
 
 /// What went wrong in this thread's last call that failed to start or stop a service: a sentence, with the last line of
 /// the service's log where that tells the reason.

@@ -1,5 +1,6 @@
 #include <unistd.h>
 
+#include <span>
 #include <string>
 
 #include <kova/instance.h>
@@ -22,7 +23,7 @@ constexpr ServiceRow kServices[] = {
 /// The file-sharing service is the host's own; an instance cannot switch it.
 constexpr ServiceRow kFileSharing = {"samba", nullptr, nullptr, "smbd.service"};
 
-bool HasServiceManager() { return kova::InstanceRoot().empty() && access("/run/systemd/system", F_OK) == 0; }
+using kova::host::HasServiceManager;
 
 bool IsInstalled(const ServiceRow& service) {
   for (const char* folder : {"/etc/systemd/system/", "/run/systemd/system/", "/usr/local/lib/systemd/system/",
@@ -78,6 +79,14 @@ int Stop(const char* name) {
 
 }  // namespace
 
+namespace kova::host {
+
+std::span<const ServiceRow> ChildServices() { return kServices; }
+
+bool HasServiceManager() { return InstanceRoot().empty() && access("/run/systemd/system", F_OK) == 0; }
+
+}  // namespace kova::host
+
 int KLIBServiceStart(const char* name, int now) {
   (void)now;
   return Start(name);
@@ -109,5 +118,5 @@ int KLIBServiceIsRunning(const char* name) {
   const ServiceRow* service = Find(name);
   if (service == nullptr) return -1;
   if (HasServiceManager()) return SystemctlStatus("is-active", *service) == 0 ? 1 : 0;
-  return kova::host::IsChildServiceRunning(*service) ? 1 : 0;
+  return kova::host::ChildServicePid(*service) != 0 ? 1 : 0;
 }

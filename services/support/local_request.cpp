@@ -40,4 +40,9 @@ RequestResult AskLocally(const std::string& socket_path, const std::string& requ
   return answered ? RequestResult::kAnswered : RequestResult::kNoAnswer;
 }
 
+bool IsServed(const std::string& socket_path) {
+  Connection connection(socket_path);
+  return connection.Connect() || WhyNotConnected(errno) != RequestResult::kNotRunning;
+}
+
 }  // namespace ferrox::services

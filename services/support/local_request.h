@@ -12,4 +12,7 @@ enum class RequestResult { kAnswered, kNotRunning, kNotPermitted, kNoAnswer };
 RequestResult AskLocally(const std::string& socket_path, const std::string& request, std::chrono::milliseconds longest,
                          std::string& reply);
 
+/// Whether a process serves the socket, also one that this user may not talk to.
+bool IsServed(const std::string& socket_path);
+
 }  // namespace ferrox::services

@@ -42,7 +42,10 @@ class FakeDaemon:
             except OSError:
                 return
             with connection, connection.makefile("rwb") as stream:
-                request = json.loads(stream.read(struct.unpack("=I", stream.read(4))[0]).rstrip(b"\0"))
+                header = stream.read(4)
+                if not header:
+                    continue  # who only looks whether it is there
+                request = json.loads(stream.read(struct.unpack("=I", header)[0]).rstrip(b"\0"))
                 command = request.get("type") or request["command"]
                 self.asked.append((command, request["data"]))
                 answer = self.answers[command]

@@ -32,7 +32,7 @@ mkdir "$share"
 echo lantern >"$share/a.txt"
 chown -R 1000:1000 "$share"
 chmod 0700 "$share"
-"$bin/fileindexctl" up >/dev/null
+"$bin/fileindexctl" up --no-supervisor >/dev/null
 for daemon in "${daemons[@]}"; do
   pid=$(cat "$work/root/var/run/$daemon.pid")
   ! grep -q '^CapBnd:.*1ffffffffff$' "/proc/$pid/status" || fail "$daemon runs with every capability"

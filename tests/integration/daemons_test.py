@@ -4,10 +4,11 @@ import fcntl
 import json
 import os
 import signal
+import subprocess
 import time
 import unittest
 
-from instance import CREATE, DAEMONS, MODIFY, RENAME, InstanceTestCase, event, on_disk, to_bytes, wait_for, write
+from instance import BIN, CREATE, DAEMONS, MODIFY, RENAME, InstanceTestCase, event, on_disk, to_bytes, wait_for, write
 
 
 class DaemonsTest(InstanceTestCase):
@@ -145,6 +146,51 @@ class DaemonsTest(InstanceTestCase):
         self.assertEqual(3, done.returncode)
         self.assertIn("does not answer", status["engine"]["problem"])
         self.assertEqual(["a", "b", "c"], [share["share"] for share in status["index_daemon"]["shares"]])
+
+    def test_killed_daemons_start_again(self):
+        self.up_with_share()
+        root = self.instance.root
+        for i in range(20):  # at once, while the process is still going
+            program = ("kovanotifyd", "fileindexd", "kovaelasticd")[i % 3]
+            pid = self.instance.pid(program)
+            os.kill(pid, signal.SIGKILL)
+            self.ctl("up")
+            self.assertNotEqual(pid, self.instance.pid(program))
+        self.assertIsNone(self.instance.status()["supervisor"])
+        pid = self.instance.pid("kovanotifyd")
+        self.instance.kill("kovanotifyd")
+        done = self.instance.run("search", "--json", "nothing")
+        self.assertIn(b"notification daemon does not run", done.stderr)
+        self.assertIn("does not run", json.loads(done.stdout)["not_noticed"])
+        self.ctl("up", "--no-supervisor")
+        for supervisor in (None, "fileindex-supervisor"):  # killed itself, it is missed, and is started by the next "up"
+            if supervisor is not None:
+                self.instance.kill(supervisor)
+                self.assertIsNone(self.instance.status()["supervisor"])
+                self.assertIn(b"supervisor: does not run", self.ctl("status"))
+            ups = [subprocess.Popen([os.path.join(BIN, "fileindexctl"), "up"], env=self.instance.env,
+                                    stdout=subprocess.DEVNULL) for _ in range(3)]
+            self.assertEqual([0, 0, 0], [up.wait() for up in ups])
+            pids = {program: self.instance.pid(program) for program in DAEMONS}
+            for program in DAEMONS:
+                os.kill(pids[program], signal.SIGKILL)
+            wait_for(lambda: all(self.status_of(program) not in (None, pids[program]) for program in DAEMONS),
+                     "the daemons to be started again", 20)
+        self.assertEqual(self.instance.pid("fileindex-supervisor"), self.instance.status()["supervisor"]["pid"])
+        log = open(f"{root}/var/log/kova/fileindex-supervisor.log", encoding="utf-8").read()
+        self.assertIn("kovanotifyd ended without having been stopped, and is started again", log)
+        self.ctl("folder", "delete", "/docs")  # stops the index daemon
+        time.sleep(2.5)
+        self.assertIsNone(self.status_of("fileindexd"))
+        pid = self.instance.pid("fileindex-supervisor")
+        os.unlink(f"{root}/var/run/fileindex-supervisor.pid")
+        wait_for(lambda: not os.path.exists(f"/proc/{pid}/exe"), "the supervisor of nothing to end", 5)
+
+    def status_of(self, program):
+        """The process that the daemon says it is."""
+        names = {"kovaelasticd": "engine", "fileindexd": "index_daemon", "kovanotifyd": "notification_daemon"}
+        state = self.instance.status().get(names.get(program, "content_extraction"))
+        return state and state.get("pid")
 
     def holder(self, paths, user):
         """A process that holds shared locks on those of the files that the user may open; and how many these are."""

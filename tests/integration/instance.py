@@ -47,6 +47,8 @@ class Instance:
     # The tool.
 
     def run(self, *words):
+        """Without a supervisor: what a test kills stays down."""
+        words += ("--no-supervisor",) if words == ("up",) else ()
         return subprocess.run([os.path.join(BIN, "fileindexctl"), *words], env=self.env, capture_output=True,
                               timeout=TIMEOUT, check=False)
 
@@ -81,7 +83,7 @@ class Instance:
             return int(file.read())
 
     def note_pids(self):
-        for program in DAEMONS:
+        for program in (*DAEMONS, "fileindex-supervisor"):
             try:
                 self.pids.add(self.pid(program))
             except (OSError, ValueError):

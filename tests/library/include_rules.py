@@ -24,6 +24,8 @@ EXCEPTIONS = {("fileindex/custom_event.cpp", "fileindex/queue_mgr.h"),
               ("services/kovanotifyd/main.cpp", "platform/host/configuration.h"),
               ("services/kovanotifyd/main.cpp", "platform/host/notify_registry.h"),
               ("services/fileindexd/main.cpp", "platform/host/mounts.h"),
+              ("cli/command_status.cpp", "platform/host/child_service.h"),
+              ("services/supervisor/main.cpp", "platform/host/child_service.h"),
               ("cli/command_service.cpp", "platform/host/child_service.h")}
 
 
