@@ -5,6 +5,7 @@
 #include <map>
 #include <utility>
 
+#include "common/json_scan.h"
 #include "common/json_util.h"
 #include "fileindex/elastic/elastic_control.h"
 #include "fileindex/elastic/fields.h"
@@ -20,6 +21,8 @@ namespace elastic = fileindex::elastic;
 
 constexpr size_t kFieldMaxBytes = 64U << 10;
 constexpr size_t kNameMaxBytes = 1024;
+/// Several times what all fields and attachments need: as a tree, an answer may be fifty times as large.
+constexpr size_t kValuesMax = 4000;
 
 /// What is known without the content, and so is not for it to say.
 constexpr const char* kFacts[] = {elastic::kKOVAMDPath,
@@ -105,6 +108,7 @@ std::vector<AttachedBytes> ListedAttachments(const Json::Value& list) {
 bool ParseAnswer(const std::string& json, Json::Value& fields, std::vector<AttachedBytes>& attachments) {
   static const Types types = MakeTypes();
   Json::Value said;
+  if (CountJsonValues(json) > kValuesMax) return false;
   if (ValidUtf8Prefix(json) != json.size() || !fromString(said, json) || !said.isObject()) return false;
   for (auto member = said.begin(); member != said.end(); ++member) {
     const auto known = types.find(member.name());

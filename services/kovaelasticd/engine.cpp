@@ -5,6 +5,7 @@
 #include <optional>
 #include <vector>
 
+#include "common/json_scan.h"
 #include "common/json_util.h"
 #include "common/log.h"
 
@@ -12,7 +13,11 @@ namespace ferrox::engine {
 
 namespace {
 
-constexpr char kShapeText[] = "a request is a JSON object {\"command\": ..., \"data\": {...}} or {\"compound\": [...]}";
+/// What a request may have beside the members that are looked at.
+constexpr size_t kMembersMax = 64;
+/// Of a compound; what is beyond it is told to be left out.
+constexpr size_t kReplyMaxBytes = 256U << 20;
+constexpr size_t kNameShownBytes = 100;
 
 int ReplyCode(const Error& error) {
   // A fault in reading the request that no command named itself.
@@ -24,8 +29,9 @@ const Command& KnownCommand(const Json::Value& part) {
   if (!shaped) throw Error(Error::kEngineBadRequest, kShapeText);
   const Command* command = FindCommand(part["command"].asString());
   if (command == nullptr) {
-    throw Error(Error::kEngineUnknownCommand,
-                "there is no command \"" + part["command"].asString() + "\"; see the list in docs/formats/engine.md");
+    throw Error(Error::kEngineUnknownCommand, "there is no command \"" +
+                                                  part["command"].asString().substr(0, kNameShownBytes) +
+                                                  "\"; see the list in docs/formats/engine.md");
   }
   return *command;
 }
@@ -60,6 +66,27 @@ bool Failed(const Json::Value& reply) { return !reply["success"].asBool(); }
 
 }  // namespace
 
+/// The reply to a compound, as a text from the beginning: it has as many entries as the request has parts.
+class CompoundReply {
+ public:
+  void Add(const Json::Value& answer) {
+    has_fail_ = has_fail_ || Failed(answer);
+    std::string text = toString(answer);
+    if (entries_.size() + text.size() > kReplyMaxBytes && !Failed(answer) && answer.isMember("data")) {
+      text = toString(FailureReply(Error::kEngineBadRequest, "the reply is too long; ask for less at once"));
+      has_fail_ = true;
+    }
+    entries_ += (entries_.empty() ? "" : ",") + text;
+  }
+  std::string Text() const {
+    return "{\"data\":[" + entries_ + "],\"has_fail\":" + (has_fail_ ? "true" : "false") + ",\"success\":true}";
+  }
+
+ private:
+  std::string entries_;
+  bool has_fail_ = false;
+};
+
 Json::Value FailureReply(int code, const std::string& sentence) {
   Json::Value reply;
   reply["success"] = false;
@@ -78,71 +105,69 @@ Json::Value SuccessReply(Json::Value data) {
 Engine::Engine(const std::string& state_folder) : registry_(state_folder) {}
 
 std::string Engine::Handle(const std::string& request, const services::Peer& peer) {
-  return toString(ReplyOf([&] { return Answer(request, peer); }));
+  std::string text;
+  const Json::Value failure = ReplyOf([&] {
+    text = Answer(request, peer);
+    return Json::Value();
+  });
+  return failure.isNull() ? text : toString(failure);
 }
 
-Json::Value Engine::Answer(const std::string& request, const services::Peer& peer) {
-  Json::Value parsed;
-  if (!fromString(parsed, request) || !parsed.isObject()) throw Error(Error::kEngineBadRequest, kShapeText);
-  if (!parsed.isMember("compound")) {
-    const Command& command = KnownCommand(parsed);
-    RequireRights(command, peer);
-    CommandCall call{registry_, DataOf(parsed)};
-    return SuccessReply(command.run(call));
+std::string Engine::Answer(const std::string& request, const services::Peer& peer) {
+  const auto members = JsonMembers(request, kMembersMax);
+  if (members.has_value() && members->size() == 1 && members->front().name == "\"compound\"") {
+    CompoundParts parts(members->front().value,
+                        [&peer](const Json::Value& part) { RequireRights(KnownCommand(part), peer); });
+    return AnswerCompound(parts);
   }
-  Json::Value& parts = parsed["compound"];
-  if (!parts.isArray()) throw Error(Error::kEngineBadRequest, kShapeText);
-  for (const Json::Value& part : parts) RequireRights(KnownCommand(part), peer);
-  return AnswerCompound(parts);
+  Json::Value parsed = ParseCommand(request);
+  if (parsed.isMember("compound")) throw Error(Error::kEngineBadRequest, kShapeText);
+  const Command& command = KnownCommand(parsed);
+  RequireRights(command, peer);
+  CommandCall call{registry_, DataOf(parsed)};
+  return toString(SuccessReply(command.run(call)));
 }
 
 /// The parts in order; neighbours that change documents of one index are carried out in one go.
-Json::Value Engine::AnswerCompound(Json::Value& parts) {
-  Json::Value answers(Json::arrayValue);
+std::string Engine::AnswerCompound(CompoundParts& parts) {
+  CompoundReply reply;
   bool suggestions_done = false;
-  for (Json::ArrayIndex i = 0; i < parts.size();) {
-    const std::string name = parts[i]["command"].asString();
-    if (IsDocumentChange(name)) {
-      i = static_cast<Json::ArrayIndex>(AnswerChanges(parts, i, answers));
+  while (!parts.AtEnd()) {
+    if (IsDocumentChange(parts.Front()["command"].asString())) {
+      AnswerChanges(parts, reply);
       continue;
     }
-    Json::Value& data = DataOf(parts[i++]);
+    Json::Value part = parts.Take();
+    const std::string name = part["command"].asString();
     // One rebuilding serves all the documents that are named.
     const bool repeated = name == "update_term_suggestion" && suggestions_done;
-    answers.append(repeated ? SuccessReply(Json::Value()) : ReplyOf([&] {
-      CommandCall call{registry_, data};
+    const Json::Value answer = repeated ? SuccessReply(Json::Value()) : ReplyOf([&] {
+      CommandCall call{registry_, DataOf(part)};
       return SuccessReply(FindCommand(name)->run(call));
-    }));
-    suggestions_done = suggestions_done || (name == "update_term_suggestion" && !Failed(answers[answers.size() - 1]));
+    });
+    suggestions_done = suggestions_done || (name == "update_term_suggestion" && !Failed(answer));
+    reply.Add(answer);
   }
-  bool has_fail = false;
-  for (const Json::Value& answer : answers) has_fail = has_fail || Failed(answer);
-  Json::Value reply;
-  reply["success"] = true;
-  reply["has_fail"] = has_fail;
-  reply["data"] = std::move(answers);
-  return reply;
+  return reply.Text();
 }
 
-/// Carries out the changes from `first` on that are for the same index; returns the place behind the last.
-size_t Engine::AnswerChanges(Json::Value& parts, Json::ArrayIndex first, Json::Value& answers) {
-  const Json::Value id = parts[first]["data"]["id"];
-  Json::ArrayIndex end = first;
-  while (end < parts.size() && IsDocumentChange(parts[end]["command"].asString()) && parts[end]["data"]["id"] == id) {
-    ++end;
-  }
-  std::vector<std::optional<DocumentChange>> changes(end - first);
-  std::vector<Json::Value> replies(end - first, SuccessReply(Json::Value()));
+/// Carries out the next changes that are for the same index.
+void Engine::AnswerChanges(CompoundParts& compound, CompoundReply& reply) {
+  const Json::Value id = compound.Front()["data"]["id"];
+  std::vector<Json::Value> parts = compound.TakeWhile([&id](const Json::Value& part) {
+    return IsDocumentChange(part["command"].asString()) && part["data"]["id"] == id;
+  });
+  std::vector<std::optional<DocumentChange>> changes(parts.size());
+  std::vector<Json::Value> failures(parts.size());
   std::shared_ptr<Index> index;
-  for (Json::ArrayIndex i = first; i < end; ++i) {
-    const Json::Value reply = ReplyOf([&] {
+  for (size_t i = 0; i < parts.size(); ++i) {
+    failures[i] = ReplyOf([&] {
       Json::Value& data = DataOf(parts[i]);
       const Registry::OpenIndex open = registry_.Open(RequiredText(data, "id"));
-      changes[i - first] = ReadDocumentChange(parts[i]["command"].asString(), open, data);
+      changes[i] = ReadDocumentChange(parts[i]["command"].asString(), open, data);
       index = open.index;
-      return SuccessReply(Json::Value());
+      return Json::Value();
     });
-    if (Failed(reply)) replies[i - first] = reply;
   }
   if (index != nullptr) {
     index->Write([&](IndexStore& store) {
@@ -152,13 +177,12 @@ size_t Engine::AnswerChanges(Json::Value& parts, Json::ArrayIndex first, Json::V
           Apply(store, *changes[i]);
         } catch (const Error& error) {
           if (error.Code() == Error::kEngineStorage) throw;
-          replies[i] = FailureReply(ReplyCode(error), error.what());
+          failures[i] = FailureReply(ReplyCode(error), error.what());
         }
       }
     });
   }
-  for (Json::Value& reply : replies) answers.append(std::move(reply));
-  return end;
+  for (const Json::Value& failure : failures) reply.Add(failure.isNull() ? SuccessReply(Json::Value()) : failure);
 }
 
 }  // namespace ferrox::engine

@@ -5,10 +5,13 @@
 #include <json/value.h>
 
 #include "services/kovaelasticd/commands.h"
+#include "services/kovaelasticd/compound_parts.h"
 #include "services/kovaelasticd/registry.h"
 #include "services/support/frame_server.h"
 
 namespace ferrox::engine {
+
+class CompoundReply;
 
 /// Answers the engine's requests (docs/formats/engine.md). Any number of threads may call Handle.
 class Engine {
@@ -20,9 +23,9 @@ class Engine {
   std::string Handle(const std::string& request, const services::Peer& peer);
 
  private:
-  Json::Value Answer(const std::string& request, const services::Peer& peer);
-  Json::Value AnswerCompound(Json::Value& parts);
-  size_t AnswerChanges(Json::Value& parts, Json::ArrayIndex first, Json::Value& answers);
+  std::string Answer(const std::string& request, const services::Peer& peer);
+  std::string AnswerCompound(CompoundParts& parts);
+  void AnswerChanges(CompoundParts& compound, CompoundReply& reply);
 
   Registry registry_;
 };

@@ -1,5 +1,6 @@
 #include "services/support/frame_server.h"
 
+#include <malloc.h>
 #include <poll.h>
 #include <sys/epoll.h>
 #include <sys/eventfd.h>
@@ -35,6 +36,7 @@ constexpr size_t kReadChunkBytes = 64 * 1024;
 constexpr uint64_t kListenId = 0;
 constexpr uint64_t kStopId = 1;
 constexpr uint64_t kFirstConnectionId = 2;
+constexpr size_t kLargeBytes = 8U << 20;
 constexpr int kTickMs = 1000;
 constexpr int kFullMs = 10;
 
@@ -293,8 +295,10 @@ class FrameServer::Impl {
       if ((request_bytes_ += added) > options_.requests_limit_bytes || progress == Progress::kBroken) return Next::kEnd;
       if (progress == Progress::kMore) return Next::kReceive;
       std::string reply = handler_(connection.body, connection.peer);
+      const size_t worked_on = connection.body.size() + reply.size();
       request_bytes_ -= connection.body.size();
       connection.BeginSending(std::move(reply));
+      if (worked_on > kLargeBytes) (void)malloc_trim(0);  // what it took lies scattered, and the daemon runs for months
     }
     const Progress progress = connection.Send();
     if (progress == Progress::kBroken) return Next::kEnd;

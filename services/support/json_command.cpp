@@ -3,12 +3,16 @@
 #include <unistd.h>
 
 #include "common/error.h"
+#include "common/json_scan.h"
 #include "common/json_util.h"
 #include "common/log.h"
 
 namespace ferrox::services {
 
 namespace {
+
+/// As a tree, a request may be fifty times as large.
+constexpr size_t kValuesMax = 50000;
 
 Json::Value ErrorReply(int code, const std::string& message) {
   Json::Value reply;
@@ -22,6 +26,8 @@ Json::Value ErrorReply(int code, const std::string& message) {
 Json::Value Dispatch(const std::string& request, const Peer& peer, const JsonCommand& command) {
   FERROX_FAIL_IF(peer.uid != 0 && peer.uid != geteuid(), Error::kEngineNotPermitted,
                  "only root and the owner of this instance may steer it");
+  FERROX_FAIL_IF(CountJsonValues(request) > kValuesMax, Error::kBadArgument,
+                 "the request has too many values; no command needs more than " + std::to_string(kValuesMax));
   const size_t end = request.find_last_not_of('\0');
   Json::Value json;
   const bool parsed = fromString(json, request.substr(0, end == std::string::npos ? 0 : end + 1)) && json.isObject();

@@ -6,9 +6,11 @@
 
 #include <chrono>
 #include <filesystem>
+#include <fstream>
 #include <random>
 #include <string>
 #include <thread>
+#include <utility>
 
 #include <gtest/gtest.h>
 
@@ -50,6 +52,14 @@ class ElasticdTest : public testing::Test {
     Json::Value reply;
     if (connection.Connect() && connection.Send(request) && connection.Recv(text)) (void)fromString(reply, text);
     return reply;
+  }
+  int64_t MemoryKiB(const std::string& which) const {
+    std::ifstream status("/proc/" + std::to_string(pid_) + "/status");
+    int64_t kib = -1;
+    for (std::string word; kib < 0 && status >> word;) {
+      if (word == which) (void)(status >> kib);
+    }
+    return kib;
   }
   static bool Succeeds(const std::string& request) { return Send(request)["success"].asBool(); }
   static std::string Upsert(int number) {
@@ -123,6 +133,33 @@ TEST_F(ElasticdTest, AskedToStopItCommitsAndLeavesNothingBehind) {
   EXPECT_EQ(Total("unique1000001"), 1);
   EXPECT_TRUE(Succeeds(kCommit));
 }
+
+#if !defined(__SANITIZE_ADDRESS__) && !defined(__SANITIZE_THREAD__)
+TEST_F(ElasticdTest, LargeRequestsNeitherTakeNorKeepManyTimesTheirSize) {
+  Start();
+  CreateIndex();
+  std::string many = "[0,";
+  while (many.size() < 50'000'000) many += "0,0,0,0,";
+  for (const auto& [before, behind] : {std::pair{"", ""},
+                                       {R"({"command":"search","data":{"x":)", "0]}}"},
+                                       {R"({"compound":)", "0]}"},
+                                       {R"({"compound":[{"command":"ping","data":{"x":)", "0]}}]}"}}) {
+    const Json::Value reply = Send(before + many + behind);
+    EXPECT_EQ(reply["error"]["code"], 1403) << before << toString(reply).substr(0, 200);
+  }
+  std::string compound = R"({"compound":[)" + Upsert(0);
+  while (compound.size() < 16'000'000)
+    compound += R"(,{"command":"document_del_by_id","data":{"id":"k","doc_id":"/no"}})";
+  const Json::Value reply = Send(compound + "," + Upsert(1) + "]}");
+  EXPECT_TRUE(reply["success"].asBool() && !reply["has_fail"].asBool());
+  EXPECT_GT(reply["data"].size(), 200'000U);
+  EXPECT_TRUE(Succeeds(kCommit));
+  EXPECT_EQ(Total("unique0"), 1);
+  EXPECT_EQ(Total("unique1"), 1) << "the last part, too";
+  EXPECT_LT(MemoryKiB("VmHWM:"), 250'000);
+  EXPECT_LT(MemoryKiB("VmRSS:"), 60'000);
+}
+#endif
 
 }  // namespace
 }  // namespace ferrox::engine

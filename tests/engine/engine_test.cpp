@@ -99,8 +99,12 @@ TEST_F(EngineTest, BadRequestsAreAnsweredWithTheirCode) {
     SCOPED_TRACE(std::string(row.command) + " " + row.data);
     EXPECT_EQ(Code(row.command, row.data), row.code);
   }
-  for (const char* text : {"", "[]", "{}", "{\"command\":1}", "{\"compound\":{}}", "{\"compound\":[1]}", "\xFF",
-                           "{\"command\":\"ping\",\"data\":[]}", "{\"compound\":[{\"compound\":[]}]}"}) {
+  for (const char* text :
+       {"", "[]", "{}", "{\"command\":1}", "{\"compound\":{}}", "{\"compound\":[1]}", "\xFF",
+        "{\"command\":\"ping\",\"data\":[]}", "{\"compound\":[{\"compound\":[]}]}",
+        R"({"compound":[{"command":"ping"}],"x":1})", R"({"compound":[{"command":"ping"},]})",
+        R"({"compound":[{"command":"ping"}]}x)", R"({"compound":[{"command":"ping"} 1]})",
+        R"({"compound":[{"command":"ping"})", R"({"compound":[{"command":"ping"},{"command":"p]})"}) {
     SCOPED_TRACE(text);
     EXPECT_EQ(CodeOf(SendText(text)), 1403);
   }
@@ -150,6 +154,10 @@ TEST_F(EngineTest, CompoundsGoOnAfterAFailedPart) {
   EXPECT_EQ(Total("path:/v"), 2);
   const Json::Value empty = SendText(R"({"compound":[]})");
   EXPECT_TRUE(empty["data"].isArray() && !empty["has_fail"].asBool());
+  const Json::Value marks = SendText(
+      " { \"compound\" : [ {\"data\":{\"x\":\"\\\\\\\"]},[\"},\"command\":\"ping\"} ,\n"
+      "{\"command\":\"ping\"} ] } ");
+  EXPECT_EQ(marks["data"].size(), 2U) << toString(marks);
 }
 
 TEST_F(EngineTest, IndicesPauseMoveRenameAndGo) {

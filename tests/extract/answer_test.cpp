@@ -48,7 +48,10 @@ TEST(AnswerTest, OnlyWhatAFilesContentMaySayIsTaken) {
 TEST(AnswerTest, WhatIsNoAnswerIsRefused) {
   const std::string deep = std::string(100000, '[') + std::string(100000, ']');
   const std::string nested = "{\"KOVAMDTitle\":" + deep + "}";
-  const std::string rows[] = {"", "x", "[]", "null", "{", "{}{}", deep, nested, "{\"KOVAMDTitle\":\"\xff\"}", "{}\xff"};
+  std::string many = "{\"KOVAMDTitle\":[0";
+  for (int i = 0; i < 5000; ++i) many += ",0";
+  const std::string rows[] = {
+      many + "]}", "", "x", "[]", "null", "{", "{}{}", deep, nested, "{\"KOVAMDTitle\":\"\xff\"}", "{}\xff"};
   std::vector<extract::AttachedBytes> attachments;
   for (const std::string& row : rows) {
     Json::Value fields(Json::objectValue);

@@ -9,6 +9,7 @@
 #include <gtest/gtest.h>
 
 #include "common/error.h"
+#include "services/support/json_command.h"
 #include "tests/support/temp_dir.h"
 
 namespace ferrox::services {
@@ -148,6 +149,17 @@ TEST_F(FrameServerTest, ReplacesADeadProcessesSocketButNotALiveOnes) {
   (void)Socket(path_, bind);
   Start();
   EXPECT_THROW(FrameServer(options_, [](const std::string& body, const Peer&) { return body; }), Error);
+}
+
+TEST(JsonCommandTest, TooManyValuesAreRefusedBeforeTheyAreRead) {
+  std::string values = "0";
+  for (int i = 0; i < 60000; ++i) values += ",0";
+  const auto command = [](const std::string&, const Json::Value& data) { return Json::Value(data.size()); };
+  const auto answer = [&command](const std::string& data) {
+    return AnswerJsonCommand("{\"type\":\"x\",\"data\":[" + data + "]}", Peer{geteuid()}, command);
+  };
+  EXPECT_EQ(answer("\"" + values + "\""), R"({"data":1,"success":true})") << "a long text is none";
+  EXPECT_NE(answer(values).find("too many values"), std::string::npos);
 }
 
 }  // namespace
