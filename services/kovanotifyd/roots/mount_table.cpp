@@ -88,6 +88,10 @@ bool MountTable::IsMounted(const Mount& mount) const {
   return line != lines_.end() && line->second.entry == mount.entry;
 }
 
+bool MountTable::IsMountedAt(const std::string& point) const {
+  return std::any_of(lines_.begin(), lines_.end(), [&point](const auto& line) { return line.second.point == point; });
+}
+
 uint64_t MountTable::MountOf(const std::string& path) const {
   uint64_t nearest = 0;
   size_t depth = 0;

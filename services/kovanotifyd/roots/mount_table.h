@@ -34,6 +34,7 @@ class MountTable {
   bool IsMounted(const Mount& mount) const;
   /// The id of the mount that a real path is on, as far as the table tells: nothing is looked at but that.
   uint64_t MountOf(const std::string& path) const;
+  bool IsMountedAt(const std::string& point) const;
   /// Whether the mount's server may be away, so that a look at a path there may not come back.
   bool IsNetwork(uint64_t id) const;
 

@@ -139,8 +139,8 @@ void WatchSet::OnMountChanged(const std::string& point) {
   for (auto& [path, root] : roots_) {
     if (root.state == Root::State::kWaiting || !IsAtOrBelow(point, path)) continue;
     is_below = true;
-    const bool is_anew = !IsScanned(root) && ways_[root.way].watcher->WatchesEachFolder();
-    if (is_anew) ExamineRoot(root, true);
+    const bool may_lack_watches = !IsScanned(root) && ways_[root.way].watcher->WatchesEachFolder();
+    if (may_lack_watches && !mounts_.IsMountedAt(point)) ExamineRoot(root, true);
   }
   if (is_below) listener_.OnCompare(point);
 }
