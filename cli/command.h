@@ -41,13 +41,14 @@ class NotPermitted : public Failure {
   using Failure::Failure;
 };
 
-/// What a command needs of the instance; each also what stands before it.
+/// What a command needs of the instance; each also what stands before it, but for the table of shares.
 enum class Needs {
   kNothing,
   kReading,   ///< to read its settings
+  kAnswers,   ///< a table of shares that can be used
   kService,   ///< to steer the daemons, which only the instance's owner and root may
   kInstance,  ///< its folders, which are made when they are missing
-  kShares,    ///< the table of shares
+  kShares,    ///< and the table of shares
 };
 
 /// An option of a command, such as "--limit N".

@@ -11,6 +11,7 @@
 #include "common/clock.h"
 #include "fileindex/folder_mgr.h"
 #include "platform/host/child_service.h"
+#include "platform/host/share_table.h"
 
 namespace ferrox::cli {
 
@@ -191,9 +192,10 @@ int RunStatus(const Arguments& arguments) {
   AddWatches(notification_daemon, daemon);
   std::string problem;
   const Json::Value resting = RestingShares(daemon, problem);
+  const std::string table_problem = kova::host::ShareTable::Load(kova::host::ShareTablePath()).Problem();
   const bool has_shares = !daemon.isNull() && !daemon["shares"].empty();
   const bool needed = has_shares || !resting.empty();
-  const int code = problem.empty() ? ExitCodeOf(state, needed) : kFailure;
+  const int code = problem.empty() && table_problem.empty() ? ExitCodeOf(state, needed) : kFailure;
   if (arguments.Has("--json")) {
     Json::Value json;
     json["engine"] = StatusJson(state.engine);
@@ -202,7 +204,7 @@ int RunStatus(const Arguments& arguments) {
     json["content_extraction"] = StatusJson(state.content_extraction);
     json["supervisor"] = SupervisorJson();
     json["resting_shares"] = resting;
-    if (!problem.empty()) json["problem"] = problem;
+    if (!problem.empty() || !table_problem.empty()) json["problem"] = problem.empty() ? table_problem : problem;
     (void)printf("%s\n", ToScriptJson(json).c_str());
     return code;
   }

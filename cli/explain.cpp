@@ -10,7 +10,9 @@
 
 #include "common/file_util.h"
 #include "fileindex/util.h"
+#include "platform/host/share_table.h"
 #include "sdk/share.h"
+#include "services/support/settings_problem.h"
 
 namespace ferrox::cli {
 
@@ -38,9 +40,53 @@ constexpr Remedy kRemedies[] = {
 
 constexpr char kNotIndexable[] = "Path cannot index: ";
 
+/// What the library's own words for a failed call mean.
+struct Meaning {
+  const char* begin;
+  const char* text;
+};
+constexpr Meaning kMeanings[] = {
+    {"Request failed, msg=", "the search engine: "},
+    {"MonitorQueue::Upsert failed, share=", "the notification daemon's list cannot be given the folders of share "},
+    {"MonitorQueue::Delete failed, share=", "the notification daemon's list cannot be rid of the folders of share "},
+    {"KOVAShareNamePathGet failed, full_path=", "this lies in no share: "},
+    {"FILEIDXQueuePathCompose failed, share_path=", "no queue can be had for the folder "},
+    {"FILEIDXDBPathCompose failed, share_path=", "no index can be had for the folder "},
+    {"KLIBShareEnum failed", "the shares cannot be listed"},
+    {"Connect failed", "the search engine cannot be reached"},
+    {"Send failed", "the search engine does not take the request"},
+    {"Recv failed", "the search engine gives no answer that can be used"},
+    {"Cannot load json: ", "cannot be read or is damaged: "},
+};
+
+/// Without the JSON text that some of the library's reasons end in.
+std::string PlainReason(const Error& error) {
+  const std::string reason = error.what();
+  for (const Meaning& meaning : kMeanings) {
+    const std::string begin = meaning.begin;
+    if (StringStartWith(reason, begin)) return meaning.text + (begin.back() == 'd' ? "" : reason.substr(begin.size()));
+  }
+  return reason.substr(0, reason.find(", data="));
+}
+
+/// What is wrong with the settings that the failed step needed; empty when nothing is.
+std::string SettingsProblem(const Error& error) {
+  switch (error.Code()) {
+    case Error::kNoSuchShare:
+    case Error::kShareEnumFailed:
+    case Error::kInternal:
+      return kova::host::ShareTable::Load(kova::host::ShareTablePath()).Problem();
+    case Error::kBadArgument:
+    case Error::kLoadFailed:
+      return services::FoldersFileProblem();
+    default:
+      return {};
+  }
+}
+
 /// The library gives some of its reasons as a bare name or path.
 std::string Sentence(const Error& error) {
-  const std::string reason = error.what();
+  const std::string reason = PlainReason(error);
   const bool is_path = StringStartWith(reason, "/");
   switch (error.Code()) {
     case Error::kNoSuchShare:
@@ -117,6 +163,9 @@ std::string WhyNotIndexable(const std::string& share_path) {
 }
 
 std::string Explain(const Error& error, const std::string& note) {
+  const std::string problem = SettingsProblem(error);
+  if (!problem.empty())
+    return problem + (note.empty() ? "" : "; " + note) + " (error " + std::to_string(error.Code()) + ")";
   std::string text = Sentence(error);
   for (const std::string& part : {RemedyFor(error), note}) {
     if (!part.empty()) text += "; " + part;

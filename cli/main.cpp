@@ -55,6 +55,7 @@ void PrepareInstance(Needs needs) {
   const std::string problem = ferrox::InstanceRootProblem();
   if (!problem.empty()) throw Failure(problem);
   RequireRights(needs);
+  if (needs != Needs::kNothing && needs != Needs::kService) RequireShareTable(needs);
   if (needs < Needs::kInstance || ferrox::InstancePath("").empty()) return;
   for (const char* folder : {"/tmp", "/var/run", ferrox::kConfigurationFolder}) {
     const std::string path = ferrox::InstancePath(folder);

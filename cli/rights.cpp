@@ -6,10 +6,12 @@
 #include <unistd.h>
 
 #include <cerrno>
+#include <cstdio>
 #include <cstring>
 
 #include <kova/instance.h>
 
+#include "cli/escape.h"
 #include "common/file_util.h"
 #include "common/paths.h"
 #include "platform/host/share_table.h"
@@ -61,6 +63,13 @@ NotPermitted MayNot(const std::string& act, const std::string& path) {
                       "; run '" + command +
                       "' with the same command, or work on an instance of your own ('--root' with a folder that you "
                       "may write)");
+}
+
+void RequireShareTable(Needs needs) {
+  const std::string problem = kova::host::ShareTable::Load(kova::host::ShareTablePath()).Problem();
+  if (problem.empty()) return;
+  if (needs == Needs::kAnswers || needs == Needs::kShares) throw Failure(problem);
+  (void)fprintf(stderr, "fileindexctl: %s\n", EscapeForTerminal(problem).c_str());
 }
 
 void RequireRights(Needs needs) {

@@ -15,6 +15,10 @@ NotPermitted MayNot(const std::string& act, const std::string& path);
 /// used.
 void RequireRights(Needs needs);
 
+/// Where the table of shares cannot be used, a command that needs it is not begun, and the others say so on standard
+/// error. @throws Failure.
+void RequireShareTable(Needs needs);
+
 /// MayNot for an errno value that says so, else Failure: "cannot <act> <path>: <the system's reason><remedy>".
 [[noreturn]] void ThrowSystemFailure(int error, const std::string& act, const std::string& path,
                                      const std::string& remedy = "");

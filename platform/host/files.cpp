@@ -40,7 +40,10 @@ bool ReadAll(int fd, std::string& text) {
 std::string OneLine(const std::string& text) {
   std::istringstream words(text);
   std::string line;
-  for (std::string word; words >> word;) line += (line.empty() ? "" : " ") + word;
+  for (std::string word; words >> word;) {
+    if (word == "*") continue;  // each message begins with it
+    line += (line.empty() ? "" : " ") + word;
+  }
   return line;
 }
 

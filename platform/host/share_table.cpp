@@ -3,6 +3,7 @@
 #include <syslog.h>
 
 #include <algorithm>
+#include <atomic>
 #include <cerrno>
 #include <cstring>
 #include <mutex>
@@ -192,7 +193,14 @@ ShareTable ShareTable::With(const std::vector<ShareEntry>& samba) const {
 
 std::shared_ptr<const ShareTable> ShareTable::Current() {
   std::shared_ptr<const ShareTable> table = WithSamba(Cache().Get(ShareTablePath(), &ShareTable::Load));
-  if (table->Problem().empty()) return table;
+  static std::atomic<bool> damaged{false};
+  constexpr char kSubject[] = "share table";
+  if (table->Problem().empty()) {
+    if (damaged.exchange(false)) LogChange(LOG_INFO, kSubject, "the share table can be used again");
+    return table;
+  }
+  damaged = true;
+  LogChange(LOG_ERR, kSubject, table->Problem());
   (void)KOVA_FAIL(KOVA_ERR_BAD_CONFIGURATION);
   return nullptr;
 }

@@ -16,6 +16,7 @@
 #include "common/scope_exit.h"
 #include "fileindex/status_mgr.h"
 #include "services/support/json_command.h"
+#include "services/support/settings_problem.h"
 
 namespace ferrox::indexd {
 
@@ -105,7 +106,7 @@ void IndexDaemon::Start() {
     pause_.Set(fileindex::StatusMgr().GetPauseInfo());
   } catch (const Error& error) {
     // Every worker meets the same unreadable file and says so in its status.
-    Log(LOG_ERR, "the pause is unknown: %s", error.what());
+    Log(LOG_ERR, "the pause is unknown: %s", services::Describe(error).c_str());
   }
   Reconcile();
   follower_ = std::thread([this] { Follow(); });
@@ -124,7 +125,7 @@ void IndexDaemon::Reconcile() {
     workers_.Reconcile();
     watched_.Reconcile();
   } catch (const Error& error) {
-    Log(LOG_ERR, "the workers and watches stay as they are: %s (%d)", error.what(), error.Code());
+    Log(LOG_ERR, "the workers and watches stay as they are: %s", services::Describe(error).c_str());
   }
 }
 

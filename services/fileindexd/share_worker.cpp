@@ -26,6 +26,7 @@
 #include "services/fileindexd/path_rules.h"
 #include "services/fileindexd/queue_tail.h"
 #include "services/fileindexd/stray_documents.h"
+#include "services/support/settings_problem.h"
 
 namespace ferrox::indexd {
 
@@ -251,7 +252,9 @@ milliseconds ShareWorker::OnFailure(const Error& error) {
     status_.SetState(ShareStatus::State::kWaitingForEngine, error.what());
     return NextDelay(milliseconds(100), seconds(2));
   }
-  Tell(ShareStatus::State::kError, std::string(error.what()) + " (" + std::to_string(error.Code()) + ")");
+  const std::string detail = services::Describe(error);
+  if (delay_.count() == 0) Log(LOG_ERR, "share %s: %s", share_.c_str(), detail.c_str());
+  Tell(ShareStatus::State::kError, detail);
   return NextDelay(seconds(2), seconds(300));
 }
 

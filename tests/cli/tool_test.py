@@ -128,13 +128,31 @@ class ToolTest(unittest.TestCase):
         self.assertIn("/photos/a b\n    document, photo, \"n\"\n", shown)
         self.assertEqual(3, len(re.findall("document, photo", shown)))
 
+    def given(self, command, words, otherwise):
+        """What the usage of a command asks for, each from `words` by its name."""
+        usage = self.run_tool(*command.split(), "--help").stdout.decode().splitlines()[0].split(command, 1)[1]
+        named = re.findall(r"(?<!\S)[A-Z]\w+", re.sub(r"\[--\w.*?\]+ ?", "", usage))
+        return [words.get(word, otherwise) for word in named]
+
+    def test_damaged_table_of_shares_is_named_by_every_command(self):
+        path = f"{self.root}/etc/kova/shares.json"
+        with open(path, "w", encoding="utf-8") as file:
+            file.write("[{")
+        words = {"SHARE": "photo", "PATH": "/photo/trip", "NEW_NAME": "new", "MOUNT_POINT": "/"}
+        for command in map(" ".join, self.commands()):
+            if command not in ("up", "down", "prepare", "queue show"):  # these need no shares
+                with self.subTest(command=command):
+                    done = self.run_tool(*command.split(), *self.given(command, words, f"{self.root}/vol/photo"))
+                    self.assertIn(f"the share table {path} is not JSON: Line", done.stderr.decode())
+                    self.assertEqual(0 if command in ("folder list", "pause", "resume") else 3, done.returncode, done.stderr)
+
     def test_damaged_list_is_named_and_hides_nothing_else(self):
         with open(f"{self.root}/var/packages/Ferrox/etc/fileindex.folders", "w", encoding="utf-8") as file:
             file.write("[{")
         for words in (["folder", "list"], ["folder", "get", "/photo/trip"], ["index", "photo"]):
             done = self.run_tool(*words)
             self.assertEqual(3, done.returncode)
-            self.assertIn(b"fileindex.folders; correct the file, or move it away", done.stderr)
+            self.assertIn(b"fileindex.folders is not JSON; correct the file, or move it away", done.stderr)
         status = json.loads(self.run_tool("status", "--json").stdout)
         self.assertIn("(error 504)", status["problem"])
 
@@ -390,9 +408,7 @@ class ToolTest(unittest.TestCase):
         for mode, readers in ((0o755, ["share list", "folder list", "folder get"]), (0o700, [])):
             os.chmod(self.root, mode)
             for command in map(" ".join, self.commands()):
-                usage = self.run_tool(*command.split(), "--help").stdout.decode().splitlines()[0].split(command, 1)[1]
-                named = re.findall(r"(?<!\S)[A-Z]\w+", re.sub(r"\[--\w.*?\]+ ?", "", usage))
-                given = ["/photo/trip"] if command == "show" else [words.get(word, queue) for word in named]
+                given = ["/photo/trip"] if command == "show" else self.given(command, words, queue)
                 done = run(*command.split(), *given)
                 with self.subTest(command=command, given=given, mode=mode):
                     self.assertEqual(0 if command in readers else 5, done.returncode, done.stderr)

@@ -3,6 +3,7 @@
 import fcntl
 import json
 import os
+import pathlib
 import signal
 import subprocess
 import time
@@ -248,20 +249,33 @@ class DaemonsTest(InstanceTestCase):
             self.assertFalse(reply["success"])
             self.assertTrue(reply["error"]["msg"])
 
-    def test_corrupt_status_file_is_named_and_recovered_from(self):
+    def test_damaged_settings_are_named_and_recovered_from(self):
         folder = self.up_with_share()
         self.instance.wait_idle("docs", folder)
-        path = f"{self.instance.root}/var/packages/Ferrox/etc/fileindex.status"
-        write(path, "{broken")
-        done = self.instance.run("pause")
-        self.assertEqual(3, done.returncode)
-        self.assertIn(f"Cannot load json: {path}".encode(), done.stderr)
-        write(f"{folder}/a.txt", "heron")
-        self.instance.queue(folder, event(CREATE, f"{folder}/a.txt"))
-        wait_for(lambda: path in self.docs().get("detail", ""), "the error in the status")
-        os.remove(path)
-        self.instance.wait_idle("docs", folder)
-        self.assertEqual(1, len(self.instance.search("heron")))
+        root, etc = self.instance.root, f"{self.instance.root}/var/packages/Ferrox/etc"
+        log = pathlib.Path(f"{root}/var/log/kova/fileindexd.log")
+        self.ctl("pause")
+        self.ctl("resume")
+        rows = [(f"{etc}/fileindex.status", "{broken", "pause", "; correct the file, or move it away"),
+                (f"{etc}/fileindex.folders", '[{"path": "/docs", "name": "d", "document": "yes"}]', "folder list",
+                 ': entry 1 (/docs) has a "document" that is neither true nor false; correct the file'),
+                (f"{root}/etc/kova/shares.json", "[{", "index docs", " is not JSON: Line 1, Column 3 Missing")]
+        for path, damage, command, text in rows:
+            with open(path, encoding="utf-8") as file:
+                good = file.read()
+            write(path, damage)
+            for words in [command.split()] + [["status"]] * (command != "pause"):
+                done = self.instance.run(*words)
+                told = (done.stderr + done.stdout).decode()
+                self.assertEqual((3, True), (done.returncode, path + text in told), told)
+                self.assertNotRegex(told, "data=|x0A|KLIB")
+            name = f"{folder}/{os.path.basename(path)}.txt"
+            write(name, "heron")
+            self.instance.queue(folder, event(CREATE, name))
+            wait_for(lambda: path + text in log.read_text("utf-8"), "the line in the log", 60)
+            write(path, good)
+            self.instance.wait_idle("docs", folder)
+            self.assertIn(os.fsencode(name), self.instance.search("heron"))
 
     # The tool.
 
