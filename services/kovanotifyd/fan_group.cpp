@@ -211,6 +211,24 @@ HandleKey FanGroup::KeyOf(int fd, const HandleKey& sibling) {
   return EncodeKey(number, buffer.bytes, buffer.Get()->handle_bytes);
 }
 
+/// Where the numbers are of all but a few file systems; a number of 8 bytes first, of which one of 4 may be a part.
+FanGroup::NumberPlace FanGroup::FindNumber(const HandleKey& key, uint64_t number) {
+  for (const NumberPlace place : {NumberPlace{0, 8}, NumberPlace{4, 8}, NumberPlace{0, 4}}) {
+    if (number != 0 && NumberIn(key, place) == number) return place;
+  }
+  return {};
+}
+
+uint64_t FanGroup::NumberIn(const HandleKey& key, NumberPlace place) {
+  const size_t begin = key.empty() ? 0 : NumberLength(key) + 1 + place.at;
+  if (key.empty() || place.size == 0 || begin + place.size > key.size()) return 0;
+  return place.size == 4 ? Load<uint32_t>(key.data() + begin) : Load<uint64_t>(key.data() + begin);
+}
+
+std::string FanGroup::FormOf(const HandleKey& key) {
+  return key.empty() ? std::string() : key.substr(0, NumberLength(key) + 1) + std::to_string(key.size());
+}
+
 bool FanGroup::IsSameFileSystem(const HandleKey& a, const HandleKey& b) {
   return !a.empty() && !b.empty() && a.compare(0, NumberLength(a), b, 0, NumberLength(b)) == 0;
 }

@@ -77,6 +77,19 @@ class FanGroup {
   HandleKey KeyOf(int fd);
   /// The same, when it is on the file system of `sibling`; a little cheaper.
   HandleKey KeyOf(int fd, const HandleKey& sibling);
+  /// How many bytes of a key's handle are before the file's number, and how many the number has, both 0 when that is
+  /// not known: each kind of file system has its own form.
+  struct NumberPlace {
+    uint8_t at = 0;
+    uint8_t size = 0;
+  };
+  /// Found by the key of something whose number is known.
+  static NumberPlace FindNumber(const HandleKey& key, uint64_t number);
+  /// The number in the key's handle; 0 when it has none there.
+  static uint64_t NumberIn(const HandleKey& key, NumberPlace place);
+  /// Keys with the same form have it in the same place.
+  static std::string FormOf(const HandleKey& key);
+
   /// Whether both are of one file system.
   static bool IsSameFileSystem(const HandleKey& a, const HandleKey& b);
   /// Opens what the key stands for; `mount` is any folder open on its file system. Not valid with errno set, ESTALE

@@ -252,7 +252,8 @@ class LiveTest(unittest.TestCase):
             self.skipTest("the other cases are those of an ordinary user")
         cases = ["LiveTest.test_changes_by_inode_marks", "LiveTest.test_changes_by_inotify",
                  "LiveTest.test_changes_by_periodic_scan", "LiveTest.test_default_way_is_the_best_there_is",
-                 "LiveTest.test_unreadable_folder_is_watched_again_when_it_can_be_read"]
+                 "LiveTest.test_unreadable_folder_is_watched_again_when_it_can_be_read",
+                 "LiveTest.test_writes_through_names_that_say_nothing_of_the_others_by_inode_marks"]
         python = shutil.which("python3", path="/usr/bin:/bin") or sys.executable
         with tempfile.TemporaryDirectory() as folder:  # the programs, where such a user can reach them
             os.chmod(folder, 0o755)
@@ -309,8 +310,17 @@ class LiveTest(unittest.TestCase):
         self.expect_index_is_disk()
 
     def test_writes_through_names_that_say_nothing_of_the_others(self):
-        docs, media, outside = self.use_way("fanotify")
-        names = [f"{docs}/b.txt", f"{media}/b.txt", f"{outside}/b.txt"]
+        self.check_other_names("fanotify", ("docs", "media", "outside"), True)
+
+    def test_writes_through_names_that_say_nothing_of_the_others_by_inode_marks(self):
+        self.check_other_names("fanotify inode marks", ("docs", "media"), True)
+
+    def test_writes_through_names_that_say_nothing_of_the_others_by_inotify(self):
+        self.check_other_names("inotify", ("docs", "media"), False)
+
+    def check_other_names(self, way, folders, names_go):
+        docs, _, outside = self.use_way(way)
+        names = [f"{os.path.dirname(docs)}/{folder}/b.txt" for folder in folders]
         write(f"{docs}/a.txt", "begin")
         for number in range(50):
             write(f"{docs}/other{number}.txt", "other")
@@ -318,7 +328,7 @@ class LiveTest(unittest.TestCase):
 
         def written():
             return sum(share["written"] for share in self.instance.status()["index_daemon"]["shares"])
-        leave = (os.remove, lambda name: os.rename(name, f"{outside}/c.txt"), lambda name: None)
+        leave = (os.remove, lambda name: os.rename(name, f"{outside}/c.txt"), lambda name: None)[0 if names_go else 2:]
         for name, go in ((name, go) for name in names for go in leave):
             for turn in range(10):
                 before = written()

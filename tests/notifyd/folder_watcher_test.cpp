@@ -117,6 +117,27 @@ class FolderWatcherTest : public testing::TestWithParam<const char*> {
 INSTANTIATE_TEST_SUITE_P(Ports, FolderWatcherTest, testing::Values("inotify", "inode"),
                          [](const auto& port) { return std::string(port.param); });
 
+TEST_P(FolderWatcherTest, AFileIsToldByItsNumberWhenItsNameMayTellNothingOfTheOthers) {
+  WriteFile(root_ + "/a", "1");
+  Cover();
+  struct stat status = {};
+  ASSERT_EQ(stat((root_ + "/a").c_str(), &status), 0);
+  const std::set<uint64_t> number = {status.st_ino};
+  const std::set<uint64_t> only_inode = IsInotify() ? std::set<uint64_t>() : number;
+  const auto told = [this](const std::function<void()>& act) {
+    act();
+    Settle();
+    return std::exchange(seen_.numbers, {});
+  };
+  const std::string name = root_ + "/b";
+  const auto write = [&] { fs::create_hard_link(root_ + "/a", name), WriteFile(name, "2"); };
+  EXPECT_THAT(told([&] { WriteFile(root_ + "/a", "3"), WriteFile(root_ + "/new", "4"); }), IsEmpty());
+  EXPECT_EQ(told(write), number);
+  fs::remove(name);
+  EXPECT_EQ(told([&] { write(), fs::remove(name); }), only_inode);
+  EXPECT_EQ(told([&] { write(), fs::rename(name, dir_ / "out"), fs::remove(dir_ / "out"); }), only_inode);
+}
+
 struct Row {
   const char* claim;
   std::function<void(const std::string& root)> act;

@@ -19,6 +19,7 @@ class WatcherRecorder : public notifyd::WatchListener {
   explicit WatcherRecorder(std::string top) : top_(std::move(top) + "/") {}
 
   void OnChange(notifyd::Change change) override {
+    if (change.kind == notifyd::Change::Kind::kByNumber) return (void)numbers.insert(change.file);
     log.push_back(Text(change));
     changes.push_back(change);
     using Kind = notifyd::Change::Kind;
@@ -56,6 +57,7 @@ class WatcherRecorder : public notifyd::WatchListener {
   std::vector<std::string> log;
   std::vector<notifyd::Change> changes;
   std::set<std::string> model;
+  std::set<uint64_t> numbers;  ///< of files
 
  private:
   std::string Short(const std::string& path) const {

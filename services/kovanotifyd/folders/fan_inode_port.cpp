@@ -1,6 +1,7 @@
 #include "services/kovanotifyd/folders/fan_inode_port.h"
 
 #include <fcntl.h>
+#include <sys/stat.h>
 
 #include <cerrno>
 #include <fstream>
@@ -35,7 +36,7 @@ FolderKey Shorten(const HandleKey& handle) {
 }
 
 /// The changes that the kernel has joined in one record, in the order in which most of them come.
-void AddRecords(const FanRecord& record, std::vector<FolderRecord>& records) {
+void AddRecords(const FanRecord& record, uint64_t file, std::vector<FolderRecord>& records) {
   constexpr uint64_t kBoth = FAN_CREATE | FAN_DELETE;
   constexpr struct {
     uint64_t bits;
@@ -57,7 +58,7 @@ void AddRecords(const FanRecord& record, std::vector<FolderRecord>& records) {
   uint64_t mask = record.mask;
   for (const auto& row : kKinds) {
     if ((mask & row.bits) != row.bits) continue;
-    records.push_back({row.kind, record.IsFolder(), folder, name, 0, {}});
+    records.push_back({row.kind, record.IsFolder(), folder, name, 0, {}, file});
     mask &= ~row.bits;
   }
 }
@@ -73,8 +74,21 @@ FolderPort::Limit FanInodePort::WatchLimit() const {
 int FanInodePort::Watch(int folder, Wanted wanted, FolderKey& key) {
   const HandleKey handle = group_.KeyOf(folder);
   if (handle.empty()) return errno;
+  LearnNumbers(folder, handle);
   key = Shorten(handle);
   return group_.Mark(folder, kScope, MaskOf(wanted));
+}
+
+/// Opening files by their handles takes rights that this port does without; but a folder's number is known.
+void FanInodePort::LearnNumbers(int folder, const HandleKey& handle) {
+  const std::string form = FanGroup::FormOf(handle);
+  const auto known = number_places_.find(form);
+  if (known != number_places_.end() && known->second.size == 0) return;
+  struct stat status = {};
+  if (fstat(folder, &status) != 0) return;
+  // One that is found wrong was right by chance: what stands behind the number may be 0.
+  const bool is_right = known != number_places_.end() && FanGroup::NumberIn(handle, known->second) == status.st_ino;
+  if (!is_right) number_places_[form] = FanGroup::FindNumber(handle, status.st_ino);
 }
 
 std::string FanInodePort::Reason(int error) const { return FanGroup::Reason(error, kScope); }
@@ -92,9 +106,10 @@ bool FanInodePort::Read(std::vector<FolderRecord>& records) {
   for (const FanRecord& record : batch_.records) {
     if (record.IsOverflow()) {
       records.push_back({});
-    } else {
-      AddRecords(record, records);
+      continue;
     }
+    const auto place = number_places_.find(FanGroup::FormOf(record.target));
+    AddRecords(record, place == number_places_.end() ? 0 : FanGroup::NumberIn(record.target, place->second), records);
   }
   return true;
 }

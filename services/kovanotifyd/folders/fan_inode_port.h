@@ -1,5 +1,6 @@
 #pragma once
 
+#include <map>
 #include <string>
 #include <vector>
 
@@ -24,7 +25,11 @@ class FanInodePort : public FolderPort {
   bool Read(std::vector<FolderRecord>& records) override;
 
  private:
+  void LearnNumbers(int folder, const HandleKey& handle);
+
   FanGroup group_;
+  /// Where handles have the file's number, by their form; as few as there are kinds of file systems.
+  std::map<std::string, FanGroup::NumberPlace> number_places_;
   FanBatch batch_;
 };
 

@@ -30,6 +30,7 @@ struct FolderRecord {
   std::string_view name = {};
   FolderKey old_folder = 0;  ///< of kRenamed
   std::string_view old_name = {};
+  uint64_t file = 0;  ///< the number of the file that the name stood for, where the port can tell
 };
 
 /// The kernel's part of a watcher that needs a watch for each folder.

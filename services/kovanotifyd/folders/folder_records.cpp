@@ -35,12 +35,13 @@ void FolderWatcher::OnRecordIn(Id parent, const FolderRecord& record, WatchListe
       if (is_folder) return OnFolderCreated(parent, record.name, listener);
       return listener.OnChange({Change::Kind::kCreated, false, path});
     case Kind::kModified:
-      return listener.OnChange({Change::Kind::kModified, is_folder, path});
+      return OnFileChanged(Change::Kind::kModified, path, record.file, listener);
     case Kind::kWritten:
-      return listener.OnChange({Change::Kind::kWritten, is_folder, path});
+      return OnFileChanged(Change::Kind::kWritten, path, record.file, listener);
     case Kind::kAttributes:
-      if (is_folder) RetryUnreadable(record.name.empty() ? parent : tree_.Child(parent, record.name));
-      return listener.OnChange({Change::Kind::kAttributes, is_folder, path});
+      if (!is_folder) return OnFileChanged(Change::Kind::kAttributes, path, record.file, listener);
+      RetryUnreadable(record.name.empty() ? parent : tree_.Child(parent, record.name));
+      return listener.OnChange({Change::Kind::kAttributes, true, path});
     case Kind::kDeleted: {
       const Id child = is_folder ? tree_.Child(parent, record.name) : kNone;
       if (child != kNone) RemoveFolder(child, listener);
@@ -54,6 +55,19 @@ void FolderWatcher::OnRecordIn(Id parent, const FolderRecord& record, WatchListe
     case Kind::kLost:
       break;
   }
+}
+
+/// Other names of the file may be in other queues; or the name is gone, and with it what the queue knows of the file.
+void FolderWatcher::OnFileChanged(Change::Kind kind, const std::string& path, uint64_t number,
+                                  WatchListener& listener) {
+  listener.OnChange({kind, false, path});
+  struct stat status = {};
+  const bool is_there = lstat(path.c_str(), &status) == 0;
+  const bool has_others = is_there && S_ISREG(status.st_mode) && status.st_nlink > 1;
+  const bool is_gone = number != 0 && (!is_there || status.st_ino != number);
+  if (!has_others && !is_gone) return;
+  const uint64_t file = is_gone ? number : status.st_ino;
+  for (const auto& [root, rules] : roots_) listener.OnChange({Change::Kind::kByNumber, false, root, {}, file});
 }
 
 /// Reported when it is watched, so that whoever compares it then misses nothing that is made in it.

@@ -83,6 +83,7 @@ class FolderWatcher : public Watcher {
   void OnRecord(const FolderRecord& record, WatchListener& listener);
   void OnCookieTouched(WatchListener& listener);
   void OnRecordIn(Id parent, const FolderRecord& record, WatchListener& listener);
+  void OnFileChanged(Change::Kind kind, const std::string& path, uint64_t number, WatchListener& listener);
   void OnFolderCreated(Id parent, std::string_view name, WatchListener& listener);
   void OnRenamed(const FolderRecord& record, WatchListener& listener);
   void OnMovedAway(Id parent, const FolderRecord& record, WatchListener& listener);
