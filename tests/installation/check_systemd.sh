@@ -32,6 +32,8 @@ if [[ ! -e /srv/docs ]]; then
   echo lighthouse >/srv/docs/b.txt
   finds lighthouse
   fileindexctl status
+  fileindexctl status | tee /dev/stderr | grep "content extraction: runs"
+  ! fileindexctl status | grep "lack a protection"
   systemctl kill -s KILL fileindexd.service
   sleep 3
   expect active active active

@@ -11,6 +11,7 @@
 
 #include "common/lock_file.h"
 #include "fileindex/optree.h"
+#include "tests/support/log_capture.h"
 #include "tests/support/temp_dir.h"
 
 namespace ferrox::notifyd {
@@ -238,6 +239,9 @@ TEST_F(QueueRouterTest, ALockThatIsHeldAFullQueueAndAFullDiskHoldLines) {
     const LockFile lock(queue_, true);
     Put({Written("/v/f")});
     EXPECT_EQ(router_.FlushAll(now_), "queue " + queue_ + ": its lock is held elsewhere");
+    const test::LogCapture log;
+    for (int i = 0; i < 20; ++i) (void)router_.Flush(now_ += std::chrono::minutes(1));
+    EXPECT_TRUE(test::LogCapture::Contains("its lock is held elsewhere: process " + std::to_string(getpid())));
   }
   test::WriteFile(queue_, "half a li");
   const rlimit full = {40, RLIM_INFINITY};

@@ -8,6 +8,8 @@
 #include <cstdint>
 #include <utility>
 
+#include <kova/lock_holder.h>
+
 #include "common/clock.h"
 #include "common/line_file.h"
 #include "common/lock_file.h"
@@ -80,7 +82,9 @@ void HeldQueue::Hold(std::string reason, TimePoint now) {
     pause_ = std::clamp(2 * pause_, kFirstPause, kLongestPause);
     next_attempt_ = now + pause_;
     if (!was_told && pause_ >= kTellingPause) {
-      Log(LOG_WARNING, "queue %s: changes are held in memory: %s", path_.c_str(), reason.c_str());
+      const std::string holder = reason == kLockHeld ? kova::LockHolderText(path_) : std::string();
+      Log(LOG_WARNING, "queue %s: changes are held in memory: %s%s", path_.c_str(), reason.c_str(),
+          holder.empty() ? "" : (": " + holder).c_str());
     }
   }
   reason_ = std::move(reason);
