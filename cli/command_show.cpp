@@ -25,6 +25,7 @@ constexpr char kTextField[] = "KOVAMDTextContent";
 constexpr char kErrorField[] = "_KOVAExtractError";
 constexpr char kVersionField[] = "_KOVAExtractVersion";
 constexpr char kPathField[] = "KOVAMDPath";
+constexpr char kCutField[] = "_KOVATextCut";
 constexpr size_t kTextShownBytes = 300;
 constexpr int kPageEntries = 10000;
 
@@ -34,7 +35,7 @@ constexpr const char* kToldOtherwise[] = {kPathField,     "KOVAMDParent",       
                                           "KOVAMDIsDir",  "KOVAMDExtension",      "KOVAMDContentType",
                                           "KOVAMDFSSize", "KOVAMDLogicalSize",    "KOVAMDContentModificationDate",
                                           kErrorField,    kVersionField,          "_KOVANeedMeta",
-                                          "_KOVAStamp",   "_KOVATextEncoding",    "_KOVATextCut"};
+                                          "_KOVAStamp",   "_KOVATextEncoding",    kCutField};
 
 Json::Value Entries(const std::string& share, Json::Value query) {
   Json::Value data;
@@ -78,7 +79,9 @@ std::string Reading(const Json::Value& document) {
   if (!document["_KOVANeedMeta"].isBool()) return "not wanted; 'fileindexctl folder set --kinds' chooses what is read";
   const std::string error = TextOf(document, kErrorField);
   const std::string reader = " (reader version " + std::to_string(IntOf(document, kVersionField)) + ")";
+  if (StringStartWith(error, kPartlyRead)) return EscapeOneLine(error) + reader;
   if (!error.empty()) return "not read, or not all: " + EscapeOneLine(error) + reader;
+  if (document[kCutField].isBool()) return std::string(kPartlyRead) + "only the beginning of its text" + reader;
   return IntOf(document, kVersionField) == 0 ? "no reader for this type" : "read" + reader;
 }
 
@@ -87,7 +90,7 @@ void PrintText(const Json::Value& document, const std::string& text) {
   const std::string encoding = TextOf(document, "_KOVATextEncoding");
   PrintLine("text", Size(static_cast<int64_t>(text.size())) +
                         (encoding.empty() ? "" : ", was " + EscapeOneLine(encoding)) +
-                        (document["_KOVATextCut"].isBool() ? ", the beginning of more" : ""));
+                        (document[kCutField].isBool() ? ", the beginning of more" : ""));
   size_t end = std::min(text.size(), kTextShownBytes);
   while (end < text.size() && (static_cast<unsigned char>(text[end]) & 0xC0) == 0x80) --end;
   (void)printf("        %s%s\n", EscapeOneLine(text.substr(0, end)).c_str(), end < text.size() ? " ..." : "");
@@ -143,6 +146,7 @@ void PrintUnread(const Json::Value& document, bool json) {
   Json::Value line;
   line["path"] = document[kPathField];
   line["reason"] = document[kErrorField];
+  line["partly_read"] = StringStartWith(TextOf(document, kErrorField), kPartlyRead);
   line["reader_version"] = Json::Int64(IntOf(document, kVersionField));
   (void)printf("%s\n", ToScriptJson(line).c_str());
 }

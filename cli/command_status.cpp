@@ -9,6 +9,7 @@
 #include "cli/progress.h"
 #include "cli/watching.h"
 #include "common/clock.h"
+#include "common/file_util.h"
 #include "fileindex/folder_mgr.h"
 #include "platform/host/child_service.h"
 #include "platform/host/share_table.h"
@@ -26,6 +27,23 @@ void PrintReasons(const char* title, const Json::Value& counts, const Json::Valu
       if (path.isString()) (void)printf("      %s\n", EscapeForTerminal(path.asString()).c_str());
     }
   }
+}
+
+/// Files of which a part was read are no failures.
+void PrintExtractErrors(const Json::Value& counts, const Json::Value& examples) {
+  const std::string prefix = kPartlyRead;
+  Json::Value failed(Json::objectValue), partly(Json::objectValue), partly_examples(Json::objectValue);
+  for (const std::string& reason : counts.getMemberNames()) {
+    if (!StringStartWith(reason, prefix)) {
+      failed[reason] = counts[reason];
+      continue;
+    }
+    const std::string missing = reason.substr(prefix.size());
+    partly[missing] = counts[reason];
+    if (examples.isObject()) partly_examples[missing] = examples[reason];
+  }
+  PrintReasons("not read, or not all", failed, examples);
+  PrintReasons("partly read", partly, partly_examples);
 }
 
 std::string FoldersText(uint64_t folders) { return Count(folders) + (folders == 1 ? " folder" : " folders"); }
@@ -61,7 +79,7 @@ void PrintShare(const Json::Value& share, const std::string& notification_proble
   (void)printf("    queued: %s%s\n", Count(UintOf(share, "queued")).c_str(),
                oldest == 0 ? "" : (", the oldest for " + Duration(static_cast<double>(age))).c_str());
   if (index.isObject() && index["extract_errors"].isObject()) {
-    PrintReasons("indexed by name only", index["extract_errors"], index["extract_error_examples"]);
+    PrintExtractErrors(index["extract_errors"], index["extract_error_examples"]);
     if (!index["extract_errors"].empty()) (void)printf("      all: fileindexctl unread %s\n", name.c_str());
   }
   for (const Json::Value& folder : share["left_out"]) {

@@ -17,6 +17,9 @@ std::string Date(int64_t seconds);
 /// "0.8 s", "12 s", "3 min 20 s", "2 h 5 min".
 std::string Duration(double seconds);
 
+/// How the reason begins that an indexed file has which was read, but not all of it.
+inline constexpr char kPartlyRead[] = "partly read: ";
+
 /// Members of a reply, 0 or "" when they are missing or of another type.
 uint64_t UintOf(const Json::Value& object, const char* key);
 int64_t IntOf(const Json::Value& object, const char* key);

@@ -41,7 +41,7 @@ bool DocumentWriter::WantsContent(const std::string& path, const struct stat& st
 
 bool DocumentWriter::IsCurrent(const IndexedEntry& indexed, const struct stat& status) const {
   return indexed.stamp == Stamp(status) && indexed.with_content == WantsContent(indexed.path, status) &&
-         !IsWorthAnotherTry(indexed);
+         !indexed.cut_untold && !IsWorthAnotherTry(indexed);
 }
 
 void DocumentWriter::Write(const std::string& path) {

@@ -21,6 +21,7 @@ constexpr char kNeedMetaField[] = "_KOVANeedMeta";
 constexpr char kTypeField[] = "KOVAMDContentType";
 constexpr char kVersionField[] = "_KOVAExtractVersion";
 constexpr char kErrorField[] = "_KOVAExtractError";
+constexpr char kCutField[] = "_KOVATextCut";
 
 IndexedEntry ToEntry(const Json::Value& fields) {
   IndexedEntry entry;
@@ -30,6 +31,7 @@ IndexedEntry ToEntry(const Json::Value& fields) {
   GetJsonValue(entry.content_type, fields, kTypeField, false);
   GetJsonValue(entry.extract_version, fields, kVersionField, false);
   entry.extract_failed = fields.isMember(kErrorField);
+  entry.cut_untold = fields.isMember(kCutField) && !entry.extract_failed;
   return entry;
 }
 
@@ -153,7 +155,8 @@ class Engine : public ShareIndex {
   }
 
   std::vector<IndexedEntry> Query(Json::Value query) const {
-    for (const char* field : {kPathField, kStampField, kNeedMetaField, kTypeField, kVersionField, kErrorField}) {
+    for (const char* field :
+         {kPathField, kStampField, kNeedMetaField, kTypeField, kVersionField, kErrorField, kCutField}) {
       query["load_field"].append(field);
     }
     Json::Value request = Request("document_get_by_query");

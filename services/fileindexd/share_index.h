@@ -18,6 +18,7 @@ struct IndexedEntry {
   std::string content_type = {};
   int extract_version = 0;      ///< of what read its content; 0: nothing did
   bool extract_failed = false;  ///< its content, or a part of it, could not be read
+  bool cut_untold = false;      ///< written when a text that is cut was no reason to say so
 };
 
 /// One share's index, as the daemon's work needs it; every call may throw what the engine's commands do. Several

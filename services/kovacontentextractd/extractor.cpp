@@ -46,6 +46,23 @@ std::string HeadOf(int fd) {
   return head;
 }
 
+bool Says(const Json::Value& fields, const char* flag) { return fields.get(flag, false).asBool(); }
+
+/// Text that is dropped is told, and how much there is, unless the document says already what it lacks.
+void TellCut(Json::Value& document, size_t text_bytes) {
+  constexpr size_t kCharacterMaxBytes = 4;
+  if (!Says(document, kCutField) || document.isMember(kErrorField)) return;
+  const bool full = text_bytes + kCharacterMaxBytes > kLimits.text_bytes;
+  const std::string first = "only the first " + std::to_string(kLimits.text_bytes >> 20) + " MiB of its text";
+  document[kErrorField] = std::string(kPartlyRead) + (full ? first : "only the beginning of its text");
+}
+
+/// The reason why an attachment could not be read is one of the whole document; what is partly read, is so as well.
+void TellReason(Json::Value& document, const std::string& reason) {
+  if (document.isMember(kErrorField)) return;
+  document[kErrorField] = (reason.starts_with(kPartlyRead) ? "" : "attachment: ") + reason;
+}
+
 Json::Value ErrorDocument(const std::string& reason) {
   Json::Value document;
   document[kErrorField] = reason;
@@ -156,7 +173,9 @@ Json::Value Extractor::Read(int fd, std::string_view head, const std::string& pa
   for (const auto& name : answer.fields.getMemberNames()) {
     if (!document.isMember(name)) document[name] = answer.fields[name];
   }
-  text.End(AddAttachments(answer, document, text));
+  const size_t text_bytes = AddAttachments(answer, document, text);
+  text.End(text_bytes);
+  TellCut(document, text_bytes);
   return document;
 }
 
@@ -182,7 +201,11 @@ size_t Extractor::AddAttachments(const Answer& answer, Json::Value& document, Te
   const auto end = std::chrono::steady_clock::now() + kAttachmentsLongest;
   size_t bytes = answer.text_bytes;
   for (const AttachedFile& attachment : answer.attachments) {
-    if (bytes + 1 >= kLimits.text_bytes || std::chrono::steady_clock::now() > end) break;
+    const bool full = bytes + 1 >= kLimits.text_bytes;
+    const bool late = std::chrono::steady_clock::now() > end;
+    if (full) document[kCutField] = true;
+    if (late) TellReason(document, std::string(kPartlyRead) + "not all of its attachments");
+    if (full || late) break;
     if (!attachment.file.Valid()) continue;
     const size_t begin = bytes + 1, room = kLimits.text_bytes - begin;
     size_t taken = 0;
@@ -198,10 +221,12 @@ size_t Extractor::AddAttachments(const Answer& answer, Json::Value& document, Te
     const Task task = {attachment.file.Get(), "", GetFileExtension(name, true), name, kLimits.nesting};
     const Answer found = ReadFile(task, HeadOf(task.fd), ignored, sink);
     if (found.text_bytes > 0) bytes = begin + taken;
-    if (found.text_bytes > taken || found.fields[kCutField].asBool()) document[kCutField] = true;
+    if (found.text_bytes > taken || Says(found.fields, kCutField)) document[kCutField] = true;
     const Json::Value& reason = found.fields[kErrorField];
-    if (reason.isString() && !document.isMember(kErrorField))
-      document[kErrorField] = "attachment: " + reason.asString();
+    if (reason.isString()) TellReason(document, reason.asString());
+    if (!found.attachments.empty()) {
+      TellReason(document, std::string(kPartlyRead) + "not the files within its attachments");
+    }
   }
   return bytes;
 }

@@ -122,6 +122,7 @@ TEST_F(ContentExtractTest, LongTextComesWholeUpToTheLimit) {
   const Json::Value document = ParseBytes("long.txt", text);
   EXPECT_EQ(text.substr(0, kMiB / 3 * 3), document["KOVAMDTextContent"].asString());
   EXPECT_TRUE(document["_KOVATextCut"].asBool());
+  EXPECT_EQ("partly read: only the first 1 MiB of its text", document["_KOVAExtractError"].asString());
 }
 
 TEST_F(ContentExtractTest, SpecialAndUnreadableFilesAreNamesWithAReason) {

@@ -69,6 +69,20 @@ TEST(MailTest, BoxOfMessages) {
   EXPECT_FALSE(document.isMember("KOVAMDTitle"));
 }
 
+TEST(MailTest, WhatIsLeftOutIsTold) {
+  const auto reason = [](const std::string& message) { return Text(Read(&ReadMail, message), "_KOVAExtractError"); };
+  std::string deep = "text", people = "a@example.org", parts;
+  for (int level = 0; level < 4; ++level) deep = "Content-Type: message/rfc822\r\n\r\n" + deep;
+  for (int i = 0; i < 600; ++i) people += ",\r\n b" + std::to_string(i) + "@example.org";
+  for (int i = 0; i < 51; ++i) parts += "--x\r\nContent-Type: application/pdf\r\n\r\n%PDF-\r\n";
+  EXPECT_EQ("", reason(Sample()));
+  EXPECT_EQ("partly read: not the messages deep within others", reason(deep));
+  EXPECT_EQ("partly read: not all of its people", reason("To: " + people + "\r\n\r\nx"));
+  EXPECT_EQ("partly read: not all of its attachments",
+            reason("Content-Type: multipart/mixed; boundary=x\r\n\r\n" + parts + "--x--\r\n"));
+  EXPECT_EQ("partly read: not all of a long field", reason("Keywords: " + std::string(40000, 'k') + "\r\n\r\nx"));
+}
+
 TEST(MailTest, HostileMessagesAreBorne) {
   std::string deep = kHeader, messages = "Subject: 0\n";
   for (int i = 0; i < 20000; ++i) {

@@ -100,7 +100,7 @@ class ExtractionTest(InstanceTestCase):
             reply = self.instance.ask("kovaelasticd", {"command": "document_set_by_id", "data": {
                 "id": "fileindex_docs", "doc_id": f"{folder}/{name}.txt", "data": change}})
             self.assertTrue(reply["success"], reply)
-        self.assertIn(b"indexed by name only: 2 crashed the reader", self.commit_and_status())
+        self.assertIn(b"not read, or not all: 2 crashed the reader", self.commit_and_status())
         written = self.docs()["written"]
         self.ctl("index", "docs", "--wait")
         self.assertEqual({"older.txt": {"_KOVAExtractError": None}, "same.txt": {"_KOVAExtractError": "crashed the reader"},
@@ -109,6 +109,27 @@ class ExtractionTest(InstanceTestCase):
         write(f"{folder}/same.txt", "balloon changed")
         self.ctl("index", "docs", "--wait")
         self.assertIsNone(self.fields(folder, "_KOVAExtractError")["same.txt"]["_KOVAExtractError"])
+
+    def test_text_that_is_dropped_is_told(self):
+        reason = "partly read: only the first 1 MiB of its text"
+        folder = self.indexed(long="balloon " + "zeppelin " * 200000, short="balloon")
+        self.instance.wait_idle("docs", folder)
+        # What an index written before says of such a file, a comparison mends.
+        reply = self.instance.ask("kovaelasticd", {"command": "document_set_by_id", "data": {
+            "id": "fileindex_docs", "doc_id": f"{folder}/long.txt", "data": {"_KOVAExtractError": None}}})
+        self.assertTrue(reply["success"], reply)
+        self.ctl("index", "docs", "--wait")
+        self.assertEqual({"long.txt": {"_KOVAExtractError": reason}, "short.txt": {"_KOVAExtractError": None}},
+                         self.fields(folder, "_KOVAExtractError"))
+        written = self.docs()["written"]
+        self.ctl("index", "docs", "--wait")
+        self.assertEqual(written, self.docs()["written"], "once")
+        self.assertIn(b"partly read: 1 only the first 1 MiB of its text", self.commit_and_status())
+        self.assertIn(f"content: {reason} (reader version 1)".encode(), self.ctl("show", f"{folder}/long.txt"))
+        unread = [json.loads(line) for line in self.ctl("unread", "docs", "--json").splitlines()]
+        self.assertEqual([(f"{folder}/long.txt", reason, True)],
+                         [(line["path"], line["reason"], line["partly_read"]) for line in unread])
+        self.assertEqual(2, len(self.instance.search("balloon")))
 
     def test_reader_that_is_not_installed_costs_nothing_and_is_used_once_it_is(self):
         pdf = (b"%PDF-1.4\n1 0 obj<</Type/Catalog/Pages 2 0 R>>endobj\n2 0 obj<</Type/Pages/Kids[3 0 R]/Count 1>>endobj\n"

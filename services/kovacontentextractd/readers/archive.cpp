@@ -178,6 +178,7 @@ void AddNames(archive* reader, MemberNames& names, Findings& findings) {
     if (name != nullptr && !names.Add(name)) return;
     if (!SkipMember(reader, findings)) return findings.Fail(ProblemOf(reader));
   }
+  findings.MarkCut();
 }
 
 /// The names of a ZIP file, out of the list at its end. False when it has none that makes sense.

@@ -17,6 +17,7 @@ constexpr size_t kFieldMaxBytes = 32U << 10;
 constexpr int kAppendMax = 50000;
 /// Of an attachment's name, the end: what matters of it is the extension.
 constexpr size_t kNameMaxBytes = 255;
+constexpr std::string_view kLongField = "not all of a long field";
 constexpr std::string_view kBetweenValues = ", ";
 constexpr std::string_view kReplacement = "\xEF\xBF\xBD";
 constexpr std::string_view kBlanks("\0 \t\r\n\v\f", 7);
@@ -35,11 +36,12 @@ void AppendClean(std::string& out, std::string_view text) {
   for (size_t zero = begin; (zero = out.find('\0', zero)) != std::string::npos;) out[zero] = ' ';
 }
 
-/// A field's value: clean, without blanks at either end, not too long.
-std::string FieldValue(std::string_view text) {
+/// A field's value: clean, without blanks at either end, and not too long, for which it may be `cut`.
+std::string FieldValue(std::string_view text, bool& cut) {
   const size_t first = text.find_first_not_of(kBlanks);
   if (first == std::string_view::npos) return {};
   text = text.substr(first, text.find_last_not_of(kBlanks) + 1 - first);
+  cut = text.size() > kFieldMaxBytes;
   std::string value;
   AppendClean(value, CutAtCharacter(text, kFieldMaxBytes));
   value.resize(CutAtCharacter(value, kFieldMaxBytes).size());
@@ -81,7 +83,9 @@ void Findings::Break() {
 }
 
 void Findings::Set(const char* field, std::string_view value) {
-  std::string clean = FieldValue(value);
+  bool cut = false;
+  std::string clean = FieldValue(value, cut);
+  if (cut) Omit(kLongField);
   if (!clean.empty()) fields_[field] = std::move(clean);
 }
 
@@ -89,12 +93,16 @@ void Findings::Append(const char* field, std::string_view value) {
   const Json::Value* present = fields_.find(field, field + strlen(field));
   const std::string_view joined = present != nullptr ? View(*present) : std::string_view();
   const bool full = joined.size() + kBetweenValues.size() >= kFieldMaxBytes || appended_ == kAppendMax;
-  const std::string added = full ? std::string() : FieldValue(value);
+  bool cut = full && !value.empty();
+  const std::string added = full ? std::string() : FieldValue(value, cut);
+  if (cut) Omit(kLongField);
   if (added.empty()) return;
   ++appended_;
   if (joined.empty()) return Set(field, added);
+  if (Holds(joined, added)) return;
   const bool fits = joined.size() + kBetweenValues.size() + added.size() <= kFieldMaxBytes;
-  if (fits && !Holds(joined, added)) fields_[field] = std::string(joined) + std::string(kBetweenValues) + added;
+  if (!fits) return Omit(kLongField);
+  fields_[field] = std::string(joined) + std::string(kBetweenValues) + added;
 }
 
 void Findings::SetInteger(const char* field, int64_t value) { fields_[field] = Json::Int64(value); }
@@ -108,20 +116,28 @@ size_t Findings::AttachmentRoom() const {
 }
 
 void Findings::Attach(Attachment attachment) {
-  if (attachment.bytes.empty() || attachment.bytes.size() > AttachmentRoom()) return;
+  if (attachment.bytes.empty()) return;
+  if (attachment.bytes.size() > AttachmentRoom()) return Omit("not all of its attachments");
   attached_bytes_ += attachment.bytes.size();
   const size_t begin = attachment.name.size() - std::min(attachment.name.size(), kNameMaxBytes);
-  attachment.name = FieldValue(std::string_view(attachment.name).substr(begin));
+  bool cut = false;
+  attachment.name = FieldValue(std::string_view(attachment.name).substr(begin), cut);
   attachments_.push_back(std::move(attachment));
 }
 
 void Findings::Fail(std::string_view reason) {
-  if (failure_.empty()) failure_ = FieldValue(reason);
+  bool cut = false;
+  if (failure_.empty()) failure_ = FieldValue(reason, cut);
+}
+
+void Findings::Omit(std::string_view what) {
+  if (omitted_.empty()) omitted_ = what;
 }
 
 Json::Value Findings::ToFields() const {
   Json::Value fields = fields_;
   if (cut_) fields["_KOVATextCut"] = true;
+  if (!omitted_.empty()) fields["_KOVAExtractError"] = std::string(kPartlyRead) + omitted_;
   if (!failure_.empty()) fields["_KOVAExtractError"] = failure_;
   return fields;
 }

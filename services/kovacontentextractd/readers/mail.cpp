@@ -77,6 +77,7 @@ class MailReader {
       parts_ = 0;
       if (!AddMessageText(message.get(), 0) || !is_box_ || g_mime_parser_eos(parser.get()) != FALSE) return;
     }
+    findings_.MarkCut();
   }
 
   void AddHeader(GMimeMessage* message) {
@@ -106,7 +107,9 @@ class MailReader {
   }
 
   void AddAddresses(InternetAddressList* list, const char* names, const char* addresses, int level) {
-    const int count = list != nullptr && level < 3 ? std::min(internet_address_list_length(list), kAddressesMax) : 0;
+    const int length = list != nullptr ? internet_address_list_length(list) : 0;
+    const int count = level < 3 ? std::min(length, kAddressesMax) : 0;
+    if (count < length) findings_.Omit("not all of its people");
     for (int i = 0; i < count; ++i) {
       InternetAddress* address = internet_address_list_get_address(list, i);
       const std::string name = HeaderText(internet_address_get_name(address));
@@ -128,7 +131,8 @@ class MailReader {
   }
 
   bool AddObject(GMimeObject* object, int level) {
-    if (object == nullptr || level > kLevelsMax || ++parts_ > kPartsMax) return true;
+    if (object == nullptr) return true;
+    if (level > kLevelsMax || ++parts_ > kPartsMax) return LeaveOut("not all of its parts");
     if (GMIME_IS_MULTIPART(object)) return AddMultipart(GMIME_MULTIPART(object), level);
     if (GMIME_IS_MESSAGE_PART(object)) {
       return AddInnerMessage(g_mime_message_part_get_message(GMIME_MESSAGE_PART(object)), level);
@@ -138,11 +142,17 @@ class MailReader {
 
   /// A message within a message is a file in a file.
   bool AddInnerMessage(GMimeMessage* message, int level) {
-    if (message == nullptr || depth_ == findings_.Bounds().nesting) return true;
+    if (message == nullptr) return true;
+    if (depth_ == findings_.Bounds().nesting) return LeaveOut("not the messages deep within others");
     ++depth_;
     const bool more = AddMessageText(message, level + 1);
     --depth_;
     return more;
+  }
+
+  bool LeaveOut(std::string_view what) {
+    findings_.Omit(what);
+    return true;
   }
 
   bool AddMultipart(GMimeMultipart* multipart, int level) {
@@ -213,7 +223,9 @@ class MailReader {
     if (in_page_ && disposition != GMIME_DISPOSITION_ATTACHMENT) return;  // what a page is made of: styles, scripts
     const bool has_none = Is(type, "image", "*") || Is(type, "audio", "*") || Is(type, "video", "*");
     const size_t room = findings_.AttachmentRoom();
-    if (has_none || room == 0 || depth_ >= findings_.Bounds().nesting) return;
+    if (has_none) return;
+    if (room == 0) return findings_.Omit("not all of its attachments");
+    if (depth_ >= findings_.Bounds().nesting) return findings_.Omit("not the files within its attachments");
     findings_.Attach({std::string(name), Unpacked(part, room + 1)});
   }
 

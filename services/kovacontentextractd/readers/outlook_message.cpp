@@ -54,7 +54,11 @@ void AddAttachments(const CompoundFile& file, Findings& findings) {
     findings.Break();
     if (!findings.AddText(name)) return;
     const auto content = file.Open("__substg1.0_37010102", attachment);
-    if (content == nullptr || content->Size() > findings.AttachmentRoom()) continue;
+    if (content == nullptr) continue;
+    if (content->Size() > findings.AttachmentRoom()) {
+      findings.Omit("not all of its attachments");
+      continue;
+    }
     findings.Attach({name, content->ReadAt(0, static_cast<size_t>(content->Size()))});
   }
 }

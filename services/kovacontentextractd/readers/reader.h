@@ -24,6 +24,9 @@ struct Limits {
   size_t attached_bytes = 15U << 20;    ///< of all of them
 };
 
+/// How a reason begins that says what is missing of a file that was read.
+inline constexpr std::string_view kPartlyRead = "partly read: ";
+
 /// A file within the file, which the reader of its own kind is to read.
 struct Attachment {
   std::string name;  ///< for hints
@@ -62,12 +65,15 @@ class Findings {
 
   /// How many bytes an attachment may have now; 0 when no more are taken.
   size_t AttachmentRoom() const;
-  /// Hands a file within this one on. What is beyond the limits is dropped.
+  /// Hands a file within this one on. What is beyond the limits is dropped, and that noted.
   void Attach(Attachment attachment);
 
   /// The reason why the content, or a part of it, could not be read, in a few words ("encrypted", "damaged",
   /// "expands to too much"). The first one counts; what was found besides is kept.
   void Fail(std::string_view reason);
+
+  /// Notes that something but text was left out ("not all of its attachments"); told unless there is a reason of Fail.
+  void Omit(std::string_view what);
 
   bool HasText() const { return !text_.empty(); }
   const std::string& Text() const { return text_; }
@@ -83,6 +89,7 @@ class Findings {
   bool cut_ = false;
   int appended_ = 0;  ///< values of lists
   std::string failure_;
+  std::string omitted_;
   std::vector<Attachment> attachments_;
   size_t attached_bytes_ = 0;
   Json::Value fields_ = Json::Value(Json::objectValue);
