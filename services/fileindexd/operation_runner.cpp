@@ -112,11 +112,18 @@ void OperationRunner::CarryOut(const fileindex::OP& op, Stage stage) {
   // Whoever watches this share is told of what happens in those that lie in it, too.
   const bool is_inner = context_.folders.IsInInner(path);
   if (is_inner && (op.op != fileindex::OP_RENAME || context_.folders.IsInInner(op.path))) return;
+  if (op.op == fileindex::OP_RENAME && stage == Stage::kMove) AwaitOwner(path, op.path);
   for (const Handler& handler : kHandlers) {
     const Handler::Function function = stage == Stage::kMove ? handler.move : handler.look;
     if (handler.op == op.op && function != nullptr) (this->*function)(path, op.path);
   }
   CommitIfDue();
+}
+
+/// Whoever renames a share that lies in this one says a moment later where it is now. Its files are not read meanwhile.
+void OperationRunner::AwaitOwner(const std::string& path, const std::string& old_path) const {
+  const bool was_inner = context_.folders.Inner().count(old_path) != 0 || context_.applied.Inner().count(old_path) != 0;
+  if (was_inner && !context_.folders.IsInInner(path)) context_.await_folders();
 }
 
 void OperationRunner::KeepWhatIsDone() noexcept {

@@ -43,6 +43,11 @@ struct PassContext {
   const std::set<uint64_t>& changed_files;
   /// Whether the index may hold documents of an earlier place of the share.
   bool may_hold_strays;
+  /// The folders that the index was last brought in line with.
+  const ShareFolders& applied;
+  /// Returns when the folders stay as they are although a change of them is to be expected. @throws Interrupted when
+  /// they have changed, so that the pass begins anew.
+  std::function<void()> await_folders;
   /// Files that a pass wrote ahead of the pass that has their lines, which looks at them again. Kept by the worker.
   std::set<std::string>& written_ahead;
 };
@@ -92,6 +97,7 @@ class OperationRunner {
   void LookReindex(const std::string& path, const std::string& old_path);
   void LookFullReindex(const std::string& path, const std::string& old_path);
 
+  void AwaitOwner(const std::string& path, const std::string& old_path) const;
   void CarryOut(const fileindex::OP& op, Stage stage);
   bool TakeStraysAlong();
   void TakeFoldersAlong(const std::vector<std::string>& differing);

@@ -434,7 +434,8 @@ void ShareWorker::RunPass() {
   const ShareFolders folders = LoadFolders();
   const std::set<uint64_t> changed_files = ChangedNumbersIn(queue_path_ + ".tmp");
   OperationRunner runner({share_, root_, folders, *index_, environment_.pool, interruption_, status_, held, queue_path_,
-                          environment_.keep_up_interval, changed_files, !strays_looked_for_, written_ahead_});
+                          environment_.keep_up_interval, changed_files, !strays_looked_for_, applied_.Get(),
+                          [&] { AwaitOtherFolders(folders); }, written_ahead_});
   RunOperations(queue, runner, folders, changed_files.size() > kChangedNumbersMax);
   // What went away in the meantime, with its volume for example, looked as if it had been deleted.
   runner.CheckRoot();
@@ -446,6 +447,14 @@ void ShareWorker::RunPass() {
   applied_.Set(folders, mount_point);
   status_.EndPass();
   last_pass_end_ = steady_clock::now();
+}
+
+void ShareWorker::AwaitOtherFolders(const ShareFolders& folders) {
+  const auto end = steady_clock::now() + environment_.patience;
+  while (steady_clock::now() < end) {
+    if (!AreStill(folders)) throw Interrupted();
+    interruption_.SleepFor(kEventPoll);
+  }
 }
 
 /// Where the folders differ from those that the index is in line with is compared, too: a reindex that waits in the

@@ -135,6 +135,7 @@ class ShareWorker {
   std::shared_ptr<const ShareFolders> Shown();
   std::vector<std::string> MountsLeftOut() const;
   Json::Value LeftOut(const ShareFolders& folders) const;
+  void AwaitOtherFolders(const ShareFolders& folders);
   bool AreStill(const ShareFolders& folders);
   void QueueAgainIfChanged(const OperationRunner& runner, const ShareFolders& folders);
 

@@ -428,7 +428,17 @@ class LiveTest(unittest.TestCase):
         expect(deep, outer=outer, inner=inner)
         self.instance.ctl("share", "resume", "deep")
         self.instance.shares["deep"] = deep
-        self.instance.ctl("share", "rename", "deep", "deeper")
+        self.instance.sync()
+        read = self.instance.share_status("inner")["read"]
+        names = ["deep"]
+        for number in range(6):
+            names.append(f"deep{number}")
+            self.instance.ctl("share", "rename", *names[-2:])
+            deep = f"{inner}/below/{names[-1]}"
+            self.instance.shares = {"outer": outer, "inner": inner, names[-1]: deep}
+            expect(**self.instance.shares)
+        self.assertEqual(read, self.instance.share_status("inner")["read"])
+        self.instance.ctl("share", "rename", names[-1], "deeper")
         deep = f"{inner}/below/deeper"
         self.instance.shares = {"outer": outer, "inner": inner, "deeper": deep}
         expect(outer=outer, inner=inner, deeper=deep)
