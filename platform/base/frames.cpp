@@ -2,12 +2,14 @@
 
 #include <poll.h>
 #include <sys/socket.h>
+#include <sys/time.h>
 #include <sys/un.h>
 #include <unistd.h>
 
 #include <algorithm>
 #include <cerrno>
 #include <cstring>
+#include <utility>
 
 #include "platform/base/failure.h"
 
@@ -16,6 +18,21 @@ namespace kova {
 namespace {
 
 constexpr size_t kReceiveStepBytes = 64 * 1024;
+constexpr int kConnectSec = 10;
+
+thread_local const SocketWaits* t_waits = nullptr;
+
+struct WaitScope {
+  explicit WaitScope(int socket) : fd(socket) {
+    if (t_waits != nullptr) t_waits->Begin(fd);
+  }
+  WaitScope(const WaitScope&) = delete;
+  WaitScope& operator=(const WaitScope&) = delete;
+  ~WaitScope() {
+    if (t_waits != nullptr) t_waits->End(fd);
+  }
+  const int fd;
+};
 
 /// Waits until the socket can be read or written; `timeout_ms` -1 waits for ever. A closed peer counts as ready.
 bool WaitFor(int fd, short events, int timeout_ms) {
@@ -72,8 +89,9 @@ bool SendAll(int fd, Outgoing& frame, int idle_timeout_ms) {
   return true;
 }
 
-bool RecvAll(int fd, char* data, size_t size) {
+bool RecvAll(int fd, char* data, size_t size, int idle_timeout_ms) {
   while (size > 0) {
+    if (idle_timeout_ms >= 0 && !WaitFor(fd, POLLIN, idle_timeout_ms)) return false;
     const ssize_t got = recv(fd, data, size, 0);
     if (got > 0) {
       data += got;
@@ -89,7 +107,7 @@ bool RecvAll(int fd, char* data, size_t size) {
 
 /// A connect that a signal interrupts goes on by itself; its outcome is told by SO_ERROR.
 bool FinishConnect(int fd) {
-  if (!WaitFor(fd, POLLOUT, -1)) return false;
+  if (!WaitFor(fd, POLLOUT, kConnectSec * 1000)) return false;
   int error = 0;
   socklen_t size = sizeof(error);
   if (getsockopt(fd, SOL_SOCKET, SO_ERROR, &error, &size) != 0) return false;
@@ -104,6 +122,8 @@ bool Fail() {
 
 }  // namespace
 
+const SocketWaits* SetSocketWaits(const SocketWaits* waits) { return std::exchange(t_waits, waits); }
+
 int ConnectUnixSocket(const std::string& path) {
   sockaddr_un address = {};
   address.sun_family = AF_UNIX;
@@ -114,6 +134,8 @@ int ConnectUnixSocket(const std::string& path) {
   memcpy(address.sun_path, path.c_str(), path.size() + 1);
   const int fd = socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0);
   if (fd < 0) return KOVA_FAIL_ERRNO();
+  const timeval longest = {kConnectSec, 0};
+  (void)setsockopt(fd, SOL_SOCKET, SO_SNDTIMEO, &longest, sizeof(longest));
   const bool connected = connect(fd, reinterpret_cast<const sockaddr*>(&address), sizeof(address)) == 0 ||
                          (errno == EINTR && FinishConnect(fd));
   if (connected) return fd;
@@ -130,17 +152,19 @@ bool SendFrame(int fd, const std::string& message, uint32_t limit_bytes, int idl
     return Fail();
   }
   const auto length = static_cast<uint32_t>(message.size());
+  const WaitScope wait(fd);
   Outgoing frame = {{}, message, descriptor};
   memcpy(frame.header, &length, sizeof(length));
   return SendAll(fd, frame, idle_timeout_ms) || Fail();
 }
 
-bool RecvFrame(int fd, std::string& message, uint32_t limit_bytes) {
+bool RecvFrame(int fd, std::string& message, uint32_t limit_bytes, int idle_timeout_ms) {
+  const WaitScope wait(fd);
   message.clear();
   uint32_t length = 0;
   char header[sizeof(length)];
   errno = 0;
-  if (!RecvAll(fd, header, sizeof(header))) return Fail();
+  if (!RecvAll(fd, header, sizeof(header), idle_timeout_ms)) return Fail();
   memcpy(&length, header, sizeof(length));
   if (length > limit_bytes) {
     errno = EMSGSIZE;
@@ -149,7 +173,7 @@ bool RecvFrame(int fd, std::string& message, uint32_t limit_bytes) {
   while (message.size() < length) {
     const size_t have = message.size();
     message.resize(have + std::min(length - have, std::max(kReceiveStepBytes, have)));
-    if (RecvAll(fd, message.data() + have, message.size() - have)) continue;
+    if (RecvAll(fd, message.data() + have, message.size() - have, idle_timeout_ms)) continue;
     message.clear();
     return Fail();
   }

@@ -1,5 +1,7 @@
 #include "services/fileindexd/interruption.h"
 
+#include <sys/socket.h>
+
 namespace ferrox::indexd {
 
 namespace {
@@ -19,6 +21,23 @@ void Interruption::Clear() {
   requested_ = false;
 }
 
+void Interruption::CutWaits() {
+  const std::lock_guard lock(mutex_);
+  cuts_ = true;
+  for (const int fd : sockets_) (void)shutdown(fd, SHUT_RDWR);
+}
+
+void Interruption::Begin(int fd) const {
+  const std::lock_guard lock(mutex_);
+  sockets_.insert(fd);
+  if (cuts_) (void)shutdown(fd, SHUT_RDWR);
+}
+
+void Interruption::End(int fd) const {
+  const std::lock_guard lock(mutex_);
+  sockets_.erase(fd);
+}
+
 bool Interruption::Requested() const {
   const std::lock_guard lock(mutex_);
   return requested_;
@@ -33,11 +52,15 @@ void Interruption::SleepFor(std::chrono::milliseconds duration) const {
   if (changed_.wait_for(lock, duration, [this] { return requested_; })) throw Interrupted();
 }
 
-InterruptionScope::InterruptionScope(const Interruption& interruption) : before_(t_interruption) {
+InterruptionScope::InterruptionScope(const Interruption& interruption)
+    : before_(t_interruption), waits_before_(kova::SetSocketWaits(&interruption)) {
   t_interruption = &interruption;
 }
 
-InterruptionScope::~InterruptionScope() { t_interruption = before_; }
+InterruptionScope::~InterruptionScope() {
+  t_interruption = before_;
+  (void)kova::SetSocketWaits(waits_before_);
+}
 
 void InterruptibleClock::SleepFor(std::chrono::milliseconds duration) {
   if (t_interruption == nullptr) return Clock::SleepFor(duration);

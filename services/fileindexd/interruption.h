@@ -4,8 +4,10 @@
 #include <condition_variable>
 #include <exception>
 #include <mutex>
+#include <set>
 
 #include "common/clock.h"
+#include "platform/base/frames.h"
 
 namespace ferrox::indexd {
 
@@ -16,10 +18,12 @@ class Interrupted : public std::exception {
 };
 
 /// Asks work in other threads to stop soon.
-class Interruption {
+class Interruption : public kova::SocketWaits {
  public:
   void Request();
   void Clear();
+  /// Ends the waits for other daemons, too, now and from now on: one of them may never answer.
+  void CutWaits();
   bool Requested() const;
   /// @throws Interrupted when it was requested.
   void Check() const;
@@ -27,13 +31,19 @@ class Interruption {
   void SleepFor(std::chrono::milliseconds duration) const;
 
  private:
+  void Begin(int fd) const override;
+  void End(int fd) const override;
+
   mutable std::mutex mutex_;
   mutable std::condition_variable changed_;
+  mutable std::set<int> sockets_;  ///< on which threads wait
   bool requested_ = false;
+  bool cuts_ = false;
 };
 
 /// Makes an interruption the calling thread's while it lives: the process's InterruptibleClock then wakes that thread
-/// from any sleep, also deep in the library, where a busy or absent engine is waited for.
+/// from any sleep, also deep in the library, where a busy or absent engine is waited for; and what it asks of other
+/// daemons can be cut.
 class InterruptionScope {
  public:
   explicit InterruptionScope(const Interruption& interruption);
@@ -43,6 +53,7 @@ class InterruptionScope {
 
  private:
   const Interruption* before_;
+  const kova::SocketWaits* waits_before_;
 };
 
 /// The process's clock while it lives.

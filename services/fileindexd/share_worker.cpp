@@ -43,6 +43,8 @@ constexpr seconds kSlowTimerWithoutWatch(2);
 constexpr milliseconds kEventPoll(200);
 /// Asks for nothing but a pass, which sees to what differs from the last one.
 constexpr int kPassEvent = 0;
+/// A worker that is to end waits so long for what it has asked of another daemon.
+constexpr milliseconds kAnswerGrace(1000);
 constexpr int kClearedByReindex = StatusMgr::kNeedReindex | StatusMgr::kSecondCondition;
 
 bool HasContent(const std::string& path) {
@@ -105,14 +107,34 @@ ShareWorker::ShareWorker(const std::string& share, const Environment& environmen
       watch_({queue_path_}) {}
 
 void ShareWorker::Start() {
-  thread_ = std::thread([this] { Loop(); });
+  thread_ = std::thread([this] {
+    Loop();
+    end_.set_value();
+  });
+}
+
+void ShareWorker::RequestStop() {
+  if (stopping_.exchange(true)) return;
+  stop_requested_ = steady_clock::now();
+  progress_.End("its indexing was just ended or begun anew; ask again");
+  Wake();
+}
+
+bool ShareWorker::StopWithin(milliseconds patience) {
+  RequestStop();
+  if (!thread_.joinable()) return true;
+  const auto end = steady_clock::now() + patience;
+  if (ended_.wait_until(std::min(end, stop_requested_ + kAnswerGrace)) != std::future_status::ready) {
+    interruption_.CutWaits();
+    if (ended_.wait_until(end) != std::future_status::ready) return false;
+  }
+  thread_.join();
+  return true;
 }
 
 void ShareWorker::Stop() {
-  stopping_ = true;
-  progress_.End("its indexing was just ended or begun anew; ask again");
-  Wake();
-  if (thread_.joinable()) thread_.join();
+  while (!StopWithin(std::chrono::hours(1))) {
+  }
 }
 
 void ShareWorker::Forget() {
@@ -210,7 +232,7 @@ milliseconds ShareWorker::Round() {
     return milliseconds(0);
   } catch (const Error& error) {
     status_.EndPass();
-    return OnFailure(error);
+    return stopping_ ? milliseconds(0) : OnFailure(error);
   } catch (const std::exception& error) {
     status_.EndPass();
     Log(LOG_ERR, "share %s: unexpected failure: %s", share_.c_str(), error.what());

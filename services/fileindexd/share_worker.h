@@ -4,6 +4,7 @@
 #include <chrono>
 #include <cstdint>
 #include <functional>
+#include <future>
 #include <memory>
 #include <mutex>
 #include <optional>
@@ -75,9 +76,14 @@ class ShareWorker {
 
   /// Begins to work in a thread.
   void Start();
-  /// Ends the work where it is, for good; the queue stays as it is and is taken up again by the next worker. Returns
-  /// when the thread has ended. Like Start, for one thread at a time.
+  /// Asks the work to end where it is, for good; the queue stays as it is and is taken up again by the next worker.
+  void RequestStop();
+  /// The same, and waits for that. What another daemon does not answer soon is given up. Like Start, for one thread at
+  /// a time. @return whether the thread has ended; it may hang where no daemon does, in a file system.
+  bool StopWithin(std::chrono::milliseconds patience);
+  /// The same, however long it takes.
   void Stop();
+  bool IsStopping() const { return stopping_; }
   /// Stops, and keeps nothing: the share is not indexed any more.
   void Forget();
   /// Looks again at the pause, the queue and the share's settings at once.
@@ -167,6 +173,9 @@ class ShareWorker {
   uint64_t serves_ = 0;               ///< the requests that the present round serves
   std::atomic<bool> settled_{false};  ///< the index was in line with folders and queue when the last round ended
   std::atomic<bool> stopping_{false};
+  std::chrono::steady_clock::time_point stop_requested_;
+  std::promise<void> end_;
+  std::future<void> ended_ = end_.get_future();  ///< once the thread has
   std::thread thread_;
 };
 

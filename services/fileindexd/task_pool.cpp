@@ -1,6 +1,7 @@
 #include "services/fileindexd/task_pool.h"
 
 #include <algorithm>
+#include <chrono>
 #include <utility>
 
 namespace ferrox::indexd {
@@ -9,6 +10,7 @@ namespace {
 
 constexpr size_t kWaitingPerThread = 8;
 constexpr unsigned kThreadsForUrgent = 2;
+constexpr std::chrono::milliseconds kLookForInterruption{100};
 
 }  // namespace
 
@@ -31,6 +33,16 @@ void TaskPool::Add(Job job) {
     (job.urgent ? urgent_ : unhurried_).push_back(std::move(job));
   }
   job_ready_.notify_one();
+}
+
+void TaskPool::Drop(TaskGroup& group) {
+  size_t dropped = 0;
+  {
+    const std::lock_guard lock(mutex_);
+    const auto is_its = [&group](const Job& job) { return job.group == &group; };
+    dropped = std::erase_if(urgent_, is_its) + std::erase_if(unhurried_, is_its);
+  }
+  for (; dropped > 0; --dropped) group.Finish(std::make_exception_ptr(Interrupted()));
 }
 
 TaskPool::Job TaskPool::Take() {
@@ -71,14 +83,24 @@ void TaskPool::Run(Job& job) {
 TaskGroup::~TaskGroup() {
   voided_ = true;
   std::unique_lock lock(mutex_);
-  done_.wait(lock, [this] { return unfinished_ == 0; });
+  Await(lock, [this] { return unfinished_ == 0; });
+}
+
+template <typename IsOver>
+void TaskGroup::Await(std::unique_lock<std::mutex>& lock, const IsOver& is_over) {
+  while (!done_.wait_for(lock, kLookForInterruption, is_over)) {
+    if (!voided_ && !interruption_.Requested()) continue;
+    lock.unlock();
+    pool_.Drop(*this);
+    lock.lock();
+  }
 }
 
 void TaskGroup::Submit(std::function<void()> task) {
   interruption_.Check();
   {
     std::unique_lock lock(mutex_);
-    done_.wait(lock, [this] { return unfinished_ < kWaitingPerThread * pool_.Threads() || failure_; });
+    Await(lock, [this] { return unfinished_ < kWaitingPerThread * pool_.Threads() || failure_; });
     RethrowFailure(lock);
     ++unfinished_;
   }
@@ -87,7 +109,7 @@ void TaskGroup::Submit(std::function<void()> task) {
 
 void TaskGroup::Wait() {
   std::unique_lock lock(mutex_);
-  done_.wait(lock, [this] { return unfinished_ == 0; });
+  Await(lock, [this] { return unfinished_ == 0; });
   RethrowFailure(lock);
 }
 
@@ -104,7 +126,7 @@ void TaskGroup::Finish(std::exception_ptr failure) {
 
 void TaskGroup::RethrowFailure(std::unique_lock<std::mutex>& lock) {
   if (!failure_) return;
-  done_.wait(lock, [this] { return unfinished_ == 0; });
+  Await(lock, [this] { return unfinished_ == 0; });
   std::rethrow_exception(failure_);
 }
 

@@ -37,6 +37,8 @@ class TaskPool {
     std::function<void()> task;
   };
   void Add(Job job);
+  /// Takes back those of the group's tasks that have not begun.
+  void Drop(TaskGroup& group);
   bool HasJob() const { return !urgent_.empty() || (!unhurried_.empty() && unhurried_running_ < unhurried_max_); }
   Job Take();
   void Work();
@@ -71,6 +73,10 @@ class TaskGroup {
 
  private:
   friend class TaskPool;
+  /// Waits until `is_over` of the group; once it is interrupted or of no use any more, what has not begun is dropped:
+  /// the threads may be held by another group's tasks.
+  template <typename IsOver>
+  void Await(std::unique_lock<std::mutex>& lock, const IsOver& is_over);
   void Finish(std::exception_ptr failure);
   void RethrowFailure(std::unique_lock<std::mutex>& lock);
 

@@ -14,40 +14,55 @@
 
 namespace ferrox::indexd {
 
+namespace {
+
+/// What a worker does besides asking other daemons takes no longer, unless a file system hangs.
+constexpr std::chrono::seconds kEndPatience(10);
+
+}  // namespace
+
+WorkerSet::~WorkerSet() {
+  for (const auto& [share, worker] : workers_) worker->RequestStop();
+}
+
 void WorkerSet::Reconcile() {
-  const std::lock_guard lock(mutex_);
-  ReconcileLocked();
+  const std::lock_guard order(order_mutex_);
+  ReconcileInOrder();
 }
 
 void WorkerSet::Create(const std::string& share) {
-  const std::lock_guard lock(mutex_);
-  End(share);
+  const std::lock_guard order(order_mutex_);
   commanded_[share] = Command::kCreate;
-  ReconcileLocked();
+  End(share);
+  ReconcileInOrder();
 }
 
 void WorkerSet::Delete(const std::string& share) {
-  const std::lock_guard lock(mutex_);
+  const std::lock_guard order(order_mutex_);
   commanded_[share] = Command::kDelete;
   End(share);
 }
 
 void WorkerSet::SettingChanged(const std::string& share) {
-  const std::lock_guard lock(mutex_);
+  const std::lock_guard order(order_mutex_);
   commanded_.erase(share);
-  ReconcileLocked();
-  const auto worker = workers_.find(share);
-  if (worker != workers_.end()) worker->second->Wake();
+  ReconcileInOrder();
+  if (const auto worker = Find(share)) worker->Wake();
 }
 
 void WorkerSet::WakeAll() {
-  const std::lock_guard lock(mutex_);
-  for (const auto& [share, worker] : workers_) worker->Wake();
+  for (const auto& [share, worker] : Present()) worker->Wake();
 }
 
 WorkerSet::Workers WorkerSet::Present() const {
   const std::lock_guard lock(mutex_);
   return workers_;
+}
+
+std::shared_ptr<ShareWorker> WorkerSet::Find(const std::string& share) const {
+  const std::lock_guard lock(mutex_);
+  const auto found = workers_.find(share);
+  return found != workers_.end() ? found->second : nullptr;
 }
 
 /// All are asked before the first is waited for.
@@ -97,13 +112,17 @@ uint64_t WorkerSet::FilesRead() const {
   return files;
 }
 
-/// Somebody may be asking the worker for its status, so that it is not gone when it is out of the set.
+/// Somebody may be asking the worker for its status, so that it is not gone when it is out of the set. One that hangs
+/// stays in it: no other may work on its queue. It is waited for once only.
 void WorkerSet::End(const std::string& share) {
-  const auto worker = workers_.find(share);
-  if (worker == workers_.end()) return;
-  worker->second->Stop();
-  read_by_ended_ += worker->second->FilesRead();
-  workers_.erase(worker);
+  const auto worker = Find(share);
+  if (worker == nullptr) return;
+  const bool ended = worker->StopWithin(worker->IsStopping() ? std::chrono::seconds(0) : kEndPatience);
+  FERROX_FAIL_IF(!ended, Error::kInternal,
+                 "the worker of share " + share + " does not end: its file system may hang; look at " + worker->Root());
+  const std::lock_guard lock(mutex_);
+  read_by_ended_ += worker->FilesRead();
+  workers_.erase(share);
 }
 
 std::map<std::string, WorkerSet::IndexedShare> WorkerSet::IndexedShares() {
@@ -123,21 +142,27 @@ std::map<std::string, WorkerSet::IndexedShare> WorkerSet::IndexedShares() {
   return shares;
 }
 
-void WorkerSet::ReconcileLocked() {
+void WorkerSet::ReconcileInOrder() {
   const std::map<std::string, IndexedShare> indexed_shares = IndexedShares();
   std::erase_if(commanded_, [&](const auto& item) { return indexed_shares.count(item.first) == 0; });
-  const auto workers = workers_;
-  for (const auto& [share, worker] : workers) {
+  for (const auto& [share, worker] : Present()) {
     const auto indexed = indexed_shares.find(share);
     const bool usable = indexed != indexed_shares.end() && indexed->second.root == worker->Root();
-    if (!usable || !Wants(share, indexed->second)) End(share);
-    if (!usable) worker->Forget();
+    if (usable && Wants(share, indexed->second) && !worker->IsStopping()) continue;
+    try {
+      End(share);
+      if (!usable) worker->Forget();
+    } catch (const Error&) {
+      // Logged; looked at again with the next change, or after a while.
+    }
   }
+  const Workers present = Present();
   for (const auto& [share, indexed] : indexed_shares) {
-    if (workers_.count(share) != 0 || !Wants(share, indexed)) continue;
+    if (present.count(share) != 0 || !Wants(share, indexed)) continue;
     try {
       std::shared_ptr<ShareWorker> made = make_(share);
       made->Start();
+      const std::lock_guard lock(mutex_);
       workers_[share] = std::move(made);
     } catch (const Error& error) {
       Log(LOG_ERR, "share %s gets no worker for now: %s", share.c_str(), error.what());

@@ -26,15 +26,18 @@ class WorkerSet {
   explicit WorkerSet(MakeWorker make) : make_(std::move(make)) {}
   WorkerSet(const WorkerSet&) = delete;
   WorkerSet& operator=(const WorkerSet&) = delete;
+  /// Stops all workers, at the same time.
+  ~WorkerSet();
 
   /// Makes and ends workers so that they are those of the present folders and shares. One whose share lies elsewhere
   /// now is made anew. @throws Error when the folders or shares cannot be told; nothing is changed then.
   void Reconcile();
 
   /// The share gets a worker, a new one in place of one it has, whatever its folders' pause says. Nothing happens for a
-  /// share that no folder names. @throws as Reconcile.
+  /// share that no folder names. @throws as Reconcile, and as Delete.
   void Create(const std::string& share);
   /// Ends the share's worker; it stays away until Create, SettingChanged, or until its folders were paused and resumed.
+  /// @throws Error kInternal when it does not end in time; it is to end all the same.
   void Delete(const std::string& share);
   /// Forgets what was commanded for the share, and has its worker look at the folders again. @throws as Reconcile.
   void SettingChanged(const std::string& share);
@@ -61,13 +64,15 @@ class WorkerSet {
 
   /// The present ones, for what takes longer than others can wait for.
   Workers Present() const;
-  void ReconcileLocked();
+  std::shared_ptr<ShareWorker> Find(const std::string& share) const;
+  void ReconcileInOrder();
   void End(const std::string& share);
   bool Wants(const std::string& share, const IndexedShare& indexed);
 
   MakeWorker make_;
-  mutable std::mutex mutex_;  ///< held while workers are made and stopped, so that commands keep their order
+  std::mutex order_mutex_;  ///< held while workers are made and ended; taken before the other
   std::map<std::string, Command> commanded_;
+  mutable std::mutex mutex_;    ///< of all below; held for moments, so that a worker that hangs makes nobody mute
   uint64_t read_by_ended_ = 0;  ///< files
   Workers workers_;             ///< shared with those who ask for its status
 };

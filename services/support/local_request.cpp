@@ -1,10 +1,10 @@
 #include "services/support/local_request.h"
 
-#include <poll.h>
-
 #include <cerrno>
 
 #include <kova/sock_connection.h>
+
+#include "platform/base/frames.h"
 
 namespace ferrox::services {
 
@@ -14,13 +14,8 @@ class Connection : public kovadaemon::DomainSockConnection {
  public:
   using DomainSockConnection::DomainSockConnection;
 
-  bool WaitForReply(std::chrono::milliseconds longest) const {
-    pollfd state = {fd_, POLLIN, 0};
-    int ready;
-    do {
-      ready = poll(&state, 1, static_cast<int>(longest.count()));
-    } while (ready < 0 && errno == EINTR);
-    return ready > 0;
+  bool Receive(std::string& reply, std::chrono::milliseconds longest) const {
+    return kova::RecvFrame(fd_, reply, message_limit_bytes_, static_cast<int>(longest.count()));
   }
 };
 
@@ -36,7 +31,7 @@ RequestResult AskLocally(const std::string& socket_path, const std::string& requ
                          std::string& reply) {
   Connection connection(socket_path);
   if (!connection.Connect()) return WhyNotConnected(errno);
-  const bool answered = connection.Send(request) && connection.WaitForReply(longest) && connection.Recv(reply);
+  const bool answered = connection.Send(request) && connection.Receive(reply, longest);
   return answered ? RequestResult::kAnswered : RequestResult::kNoAnswer;
 }
 

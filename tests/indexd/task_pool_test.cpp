@@ -1,5 +1,6 @@
 #include "services/fileindexd/task_pool.h"
 
+#include <future>
 #include <stdexcept>
 
 #include <gtest/gtest.h>
@@ -65,6 +66,17 @@ TEST(TaskPoolTest, InterruptionEndsSleepsInTasks) {
   group.Submit([] { Clock::Get().SleepFor(std::chrono::hours(1)); });
   interruption.Request();
   EXPECT_THROW(group.Wait(), Interrupted);
+  // Nor does it wait for threads that another group's tasks hold.
+  std::promise<void> answer;
+  const std::shared_future<void> done = answer.get_future().share();
+  const Interruption none;
+  TaskGroup hung(pool, none), next(pool, interruption);
+  interruption.Clear();
+  for (int i = 0; i < 2; ++i) hung.Submit([&done] { done.wait(); });
+  next.Submit([] {});
+  interruption.Request();
+  EXPECT_THROW(next.Wait(), Interrupted);
+  answer.set_value();
 }
 
 }  // namespace

@@ -1,9 +1,14 @@
 #include "services/fileindexd/worker_set.h"
 
+#include <sys/socket.h>
+
+#include <atomic>
 #include <sstream>
+#include <thread>
 
 #include "common/paths.h"
 #include "tests/indexd/worker_test.h"
+#include "tests/support/unix_server.h"
 
 namespace ferrox::indexd {
 namespace {
@@ -24,9 +29,9 @@ class WorkerSetTest : public testing::Test {
 
   std::unique_ptr<ShareWorker> Make(const std::string& share) {
     ++made_;
-    return std::make_unique<ShareWorker>(share, ShareWorker::Environment{pool_, pause_, [](const std::string&) {
-                                                                           return std::make_unique<FakeIndex>();
-                                                                         }});
+    ShareWorker::Environment environment{pool_, pause_};
+    if (!asks_engine_) environment.open_index = [](const std::string&) { return std::make_unique<FakeIndex>(); };
+    return std::make_unique<ShareWorker>(share, environment);
   }
 
   std::string Running() const {
@@ -54,6 +59,7 @@ class WorkerSetTest : public testing::Test {
   TaskPool pool_{2};
   PauseState pause_;
   int made_ = 0;
+  bool asks_engine_ = false;
   WorkerSet workers_;
 };
 
@@ -108,6 +114,34 @@ TEST_F(WorkerSetTest, MovedShareGetsANewWorkerAndBrokenFilesChangeNothing) {
     EXPECT_EQ("a", Running());
     test::WriteFile(path, before);
   }
+}
+
+/// The engine takes requests, and each answer ends in the middle.
+TEST_F(WorkerSetTest, HungEngineMakesNobodyMute) {
+  std::vector<UniqueFd> held;
+  std::atomic<int> asked{0};
+  const auto hang = [&](int fd) {
+    (void)send(fd, "\x10\0\0\0{", 5, MSG_NOSIGNAL);
+    held.emplace_back(dup(fd));
+    ++asked;
+  };
+  fs::create_directories(fs::path(InstancePath(kElasticdSocket)).parent_path());
+  const test::UnixServer engine(InstancePath(kElasticdSocket), hang, 1000);
+  asks_engine_ = true;
+  Configure("b", {{"", "davp"}});
+  Do("folders");
+  Do("look");
+  for (int i = 0; asked < 2 && i < 1000; ++i) usleep(10000);
+  std::thread ending([this] { Do("delete"); });
+  EXPECT_NE(std::string::npos, Running().find('b'));
+  ending.join();
+  EXPECT_EQ("b", Running());
+  Do("create");
+  EXPECT_EQ("ab", Running());
+  Configure("b", {});
+  Do("none");
+  Do("look");
+  EXPECT_EQ("", Running());
 }
 
 }  // namespace

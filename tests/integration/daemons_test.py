@@ -135,14 +135,22 @@ class DaemonsTest(InstanceTestCase):
 
     def test_hung_engine_hides_no_share(self):
         self.ctl("up")
-        for name in ("a", "b", "c"):
-            self.instance.add_share(name)
+        folders = [self.instance.add_share(name) for name in ("a", "b", "c")]
+        for name, folder in zip("abc", folders):
+            self.instance.wait_idle(name, folder)
         pid = self.instance.pid("kovaelasticd")
         os.kill(pid, signal.SIGSTOP)
         try:
+            for folder in folders:  # each worker asks the engine, and more
+                self.instance.queue(folder, *(event(MODIFY, f"{folder}/{i}") for i in range(30)))
+            wait_for(lambda: self.instance.share_status("a")["state"] == "indexing", "a to ask the engine")
             done = self.instance.run("status", "--json")
+            self.instance.ask("fileindexd", {"type": "worker_delete", "data": {"share_name": "a"}})
+            left = [share["share"] for share in self.instance.status()["index_daemon"]["shares"]]
+            self.instance.kill("fileindexd", signal.SIGTERM)
         finally:
             os.kill(pid, signal.SIGCONT)
+        self.assertEqual(["b", "c"], left)
         status = json.loads(done.stdout)
         self.assertEqual(3, done.returncode)
         self.assertIn("does not answer", status["engine"]["problem"])
