@@ -9,14 +9,15 @@ MAIL, BOX, BOOK = "message/rfc822", "application/mbox", "application/epub+zip"
 
 
 def mail(corpus):
-    def add(path, package, source, words, mime=MAIL, **fields):
+    def add(path, package, source, words, mime=MAIL, error=None, **fields):
         corpus.add(f"mail/{path}", corpus.donor_bytes(package, source), words,
-                   {f"KOVAMD{name}": value for name, value in fields.items()}, mime=mime)
+                   {f"KOVAMD{name}": value for name, value in fields.items()}, mime=mime, error=error)
 
     mailman = "usr/lib/python3/dist-packages/mailman/"
     add("letters.eml", "mailman3", mailman + "handlers/tests/data/msg_rfc822.eml", ["Plain", "body", "Attached"],
         Title="Message Subject", Authors="User", AuthorAddresses="user@example.com", Recipients="Someone",
-        ContentCreationDate=1302227690, Identifier="4D9E6AEA.1060802@example.net")
+        ContentCreationDate=1302227690, Identifier="4D9E6AEA.1060802@example.net",
+        error="partly read: not the messages deep within others")
     add("alternatives.eml", "mailman3", mailman + "handlers/tests/data/c_a_non_ascii.eml",
         ["Body", "can’t", "won’t"], Title="[pycon-aid] spammer", AuthorAddresses="office@example.com")
     add("croatian.eml", "mailman3", mailman + "chains/tests/issue144.eml", ["Ignore", "Višenamjenski"],
