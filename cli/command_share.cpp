@@ -42,16 +42,33 @@ Json::Value FoldersOf(const std::string& share) {
   return paths;
 }
 
+/// The deepest share that a folder lies in, not at, and that indexes it; "" for none.
+std::string OuterOf(const std::string& path) {
+  std::string outer;
+  size_t depth = 0;
+  for (const auto& share : kova::host::ListShares()) {
+    if (share.path.size() <= depth || !StringStartWith(path, share.path + "/")) continue;
+    for (const Json::Value& folder : FoldersOf(share.name)) {
+      if (!StringStartWith(path + "/", Dirname(share.path) + folder.asString() + "/")) continue;
+      outer = share.name;
+      depth = share.path.size();
+    }
+  }
+  return outer;
+}
+
 void RemoveShare(const std::string& name) {
   (void)OwnShare(name, "remove");
   const std::string queue_path = sdk::SDKShare(name).GetQueuePath();
   RequireEngine();
   const Json::Value folders = FoldersOf(name);
+  const std::string outer = folders.empty() ? "" : OuterOf(sdk::SDKShare(name).GetPath());
   if (!folders.empty()) RequireIndexDaemon();
   if (!folders.empty()) ChangeConfiguration([&] { fileindex::FolderDelete(folders); });
   DropRemains(name, queue_path);
   kova::host::RemoveShare(name);
-  (void)printf("share %s and its index are gone; its folder is as it was\n", EscapeForTerminal(name).c_str());
+  (void)printf("share %s and its index are gone; its folder is as it was%s%s\n", EscapeForTerminal(name).c_str(),
+               outer.empty() ? "" : ", and found again in share ", EscapeForTerminal(outer).c_str());
 }
 
 /// True when the folder is that share already.
@@ -100,22 +117,16 @@ void IndexWholeShare(const std::string& name, bool added) {
   }
 }
 
-/// Which shares have a part of its files, and of whose files it has a part now: a file is in the deepest share alone.
+/// A file is in the deepest share alone.
 void TellOfNested(const kova::host::ShareEntry& added) {
   const std::set<std::string> indexed = fileindex::FolderMgr().GetIndexedShares();
   if (indexed.count(added.name) == 0) return;
-  std::string outer;
-  size_t depth = 0;
   for (const auto& share : kova::host::ListShares()) {
-    if (indexed.count(share.name) == 0) continue;
-    if (StringStartWith(share.path, added.path + "/")) {
-      (void)printf("share %s lies in it and keeps its files, which are found there alone\n",
-                   EscapeForTerminal(share.name).c_str());
-    } else if (StringStartWith(added.path, share.path + "/") && share.path.size() > depth) {
-      outer = share.name;
-      depth = share.path.size();
-    }
+    if (indexed.count(share.name) == 0 || !StringStartWith(share.path, added.path + "/")) continue;
+    (void)printf("share %s lies in it and keeps its files, which are found there alone\n",
+                 EscapeForTerminal(share.name).c_str());
   }
+  const std::string outer = OuterOf(added.path);
   if (outer.empty()) return;
   (void)printf("it lies in share %s, which leaves it out: its files are found in share %s alone\n",
                EscapeForTerminal(outer).c_str(), EscapeForTerminal(added.name).c_str());

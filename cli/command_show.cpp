@@ -166,6 +166,14 @@ uint64_t ListUnread(const std::string& share, bool json) {
   }
 }
 
+/// Null when it does not run; one that does not answer hides nothing of what the engine tells.
+Json::Value StatusOfIndexDaemon() try {
+  return AskIndexDaemonIfRunning("status", Json::Value());
+} catch (const Failure& failure) {
+  (void)fprintf(stderr, "which folders are left out is not known: %s\n", EscapeForTerminal(failure.what()).c_str());
+  return Json::Value();
+}
+
 /// Folders of the share that are no part of its index, unless another share has them. Nothing when no daemon tells.
 uint64_t ListLeftOut(const Json::Value& daemon, const std::string& share, bool json) {
   uint64_t count = 0;
@@ -201,7 +209,7 @@ int RunUnread(const Arguments& arguments) {
   uint64_t count = 0;
   uint64_t folders = 0;
   LeftOut left_out;
-  const Json::Value daemon = AskIndexDaemonIfRunning("status", Json::Value());
+  const Json::Value daemon = StatusOfIndexDaemon();
   for (const std::string& share : IndexedShares(arguments.words)) {
     (void)left_out.Unless(share, [&] { count += ListUnread(share, arguments.Has("--json")); });
     folders += ListLeftOut(daemon, share, arguments.Has("--json"));

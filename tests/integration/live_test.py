@@ -448,7 +448,7 @@ class LiveTest(unittest.TestCase):
         self.assertLessEqual(outer_wrote() - before, 25, "what came to it alone is read")
         self.assertEqual(21, len(self.instance.search("--fresh", "duck")))
         del self.instance.shares["deeper"]
-        self.instance.ctl("share", "remove", "deeper")
+        self.assertIn("found again in share outer", self.instance.ctl("share", "remove", "deeper").decode())
         expect(outer=outer)
         self.assertIn("already", add(outer))
 
