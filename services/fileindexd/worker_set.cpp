@@ -168,7 +168,7 @@ void WorkerSet::ReconcileInOrder() {
       Log(LOG_ERR, "share %s gets no worker for now: %s", share.c_str(), error.what());
     }
   }
-  for (const auto& [share, worker] : workers_) {
+  for (const auto& [share, worker] : Present()) {
     std::vector<std::string> inner;
     for (const auto& [name, other] : indexed_shares) {
       if (StringStartWith(other.root, worker->Root() + "/")) inner.push_back(other.root);
