@@ -14,6 +14,7 @@
 #include "cli/progress.h"
 #include "common/error.h"
 #include "common/file_util.h"
+#include "fileindex/elastic/elastic_control.h"
 #include "fileindex/folder_mgr.h"
 #include "fileindex/index_mgr.h"
 #include "fileindex/optree.h"
@@ -64,6 +65,7 @@ Json::Value ShareStatusOf(const std::string& name) {
 }
 
 bool ReindexIsPending(const Share& share, const Json::Value& status) {
+  if (status["index"].isObject() && status["index"].isMember("rebuilding")) return true;
   if ((fileindex::StatusMgr().GetShareStatus(share.name) & fileindex::StatusMgr::kNeedReindex) != 0) return true;
   try {
     return fileindex::QueueMgr(share.queue_path).IsFullPathHasReindex(share.path);
@@ -110,16 +112,8 @@ uint64_t Grown(const Json::Value& before, const Json::Value& after, const char* 
   return new_value >= old_value ? new_value - old_value : new_value;
 }
 
-}  // namespace
-
-int RunIndex(const Arguments& arguments) {
-  const Share share = OpenShare(arguments.words[0]);
+int ReindexAndWait(const Share& share) {
   const auto begin = SteadyClock::now();
-  if (!arguments.Has("--wait")) {
-    QueueReindex(share);
-    (void)printf("queued: share %s will be compared with its index\n", EscapeForTerminal(share.name).c_str());
-    return kDone;
-  }
   const Json::Value before = ShareStatusOf(share.name);
   QueueReindex(share);
   const Json::Value after = WaitUntilDone(share);
@@ -127,6 +121,34 @@ int RunIndex(const Arguments& arguments) {
   (void)printf("%s: %s files examined, %s indexed, %s removed in %s\n", EscapeForTerminal(share.name).c_str(),
                Count(UintOf(after["comparison"], "examined")).c_str(), Count(Grown(before, after, "written")).c_str(),
                Count(Grown(before, after, "deleted")).c_str(), Duration(took.count()).c_str());
+  return kDone;
+}
+
+}  // namespace
+
+int RunIndex(const Arguments& arguments) {
+  const Share share = OpenShare(arguments.words[0]);
+  if (arguments.Has("--wait")) return ReindexAndWait(share);
+  QueueReindex(share);
+  (void)printf("queued: share %s will be compared with its index\n", EscapeForTerminal(share.name).c_str());
+  return kDone;
+}
+
+/// Nothing is begun without the daemon that fills the new index. One that the engine does not know it makes itself.
+int RunRebuild(const Arguments& arguments) {
+  const Share share = OpenShare(arguments.words[0]);
+  if (ShareStatusOf(share.name).isNull()) ThrowNotWorkedOn(share.name);
+  Json::Value data;
+  data["id"] = fileindex::elastic::GetFileIndexID(share.name);
+  try {
+    (void)AskEngine("index_rebuild", data);
+  } catch (const Refusal& refusal) {
+    if (refusal.Code() != Error::kEngineNoSuchIndex) throw;
+  }
+  if (arguments.Has("--wait")) return ReindexAndWait(share);
+  QueueReindex(share);
+  (void)printf("begun: the index of share %s is made anew; 'fileindexctl status' shows how far it is\n",
+               EscapeForTerminal(share.name).c_str());
   return kDone;
 }
 

@@ -175,8 +175,9 @@ Json::Value SearchIn(const Arguments& arguments, Scope& scope) {
     return nothing;
   }
   Json::Value result = Ask(SearchRequest(arguments, scope));
-  scope.searched = scope.shares.empty() || result["left_out"].size() < scope.shares.size();
+  const size_t before = scope.left_out.Unsearched();
   scope.left_out.AddFrom(result["left_out"]);
+  scope.searched = scope.shares.empty() || scope.left_out.Unsearched() - before < scope.shares.size();
   return result;
 }
 

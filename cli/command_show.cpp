@@ -117,6 +117,7 @@ bool Show(const std::string& file, const Arguments& arguments, LeftOut& left_out
   Json::Value documents;
   if (!left_out.Unless(share, [&] { documents = Entries(share, QueryOf(path)); })) return false;
   if (documents.empty()) {
+    if (left_out.AddIfRebuilding(share)) return false;
     (void)fprintf(stderr, "%s is not in the index; 'fileindexctl index %s' looks for what is not\n",
                   EscapeForTerminal(path).c_str(), EscapeForTerminal(share).c_str());
     return false;
@@ -211,7 +212,10 @@ int RunUnread(const Arguments& arguments) {
   LeftOut left_out;
   const Json::Value daemon = StatusOfIndexDaemon();
   for (const std::string& share : IndexedShares(arguments.words)) {
-    (void)left_out.Unless(share, [&] { count += ListUnread(share, arguments.Has("--json")); });
+    (void)left_out.Unless(share, [&] {
+      count += ListUnread(share, arguments.Has("--json"));
+      (void)left_out.AddIfRebuilding(share);
+    });
     folders += ListLeftOut(daemon, share, arguments.Has("--json"));
   }
   if (fflush(stdout) != 0) throw Failure("standard output cannot be written");

@@ -74,6 +74,11 @@ void PrintShare(const Json::Value& share, const std::string& notification_proble
                  IntOf(share, "last_commit") == 0 ? "no change since the daemon started"
                                                   : ("last change " + Date(IntOf(share, "last_commit"))).c_str());
   }
+  if (index.isObject() && index["rebuilding"].isObject()) {
+    (void)printf("    being rebuilt since %s, because %s; searches find what is indexed by now\n",
+                 Date(IntOf(index["rebuilding"], "since")).c_str(),
+                 EscapeOneLine(TextOf(index["rebuilding"], "reason")).c_str());
+  }
   const int64_t oldest = IntOf(share, "oldest_change");
   const int64_t age = oldest == 0 ? 0 : Clock::Get().Now() - oldest;
   (void)printf("    queued: %s%s\n", Count(UintOf(share, "queued")).c_str(),

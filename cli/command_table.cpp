@@ -111,6 +111,12 @@ CommandGroup Folders() {
                "Has a share compared with its index; what differs is indexed.",
                &RunIndex,
                Needs::kShares},
+              {"rebuild",
+               "SHARE",
+               {{"--wait", nullptr, "wait until it is done, and show progress"}},
+               "Makes the index of a share anew and reads all its files. Searches find what is indexed by then.",
+               &RunRebuild,
+               Needs::kShares},
           }};
 }
 

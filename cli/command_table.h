@@ -47,6 +47,7 @@ int RunFolderReindex(const Arguments& arguments);
 int RunFolderGet(const Arguments& arguments);
 int RunFolderList(const Arguments& arguments);
 int RunIndex(const Arguments& arguments);
+int RunRebuild(const Arguments& arguments);
 int RunSuggestRefresh(const Arguments& arguments);
 int RunSearch(const Arguments& arguments);
 int RunShow(const Arguments& arguments);

@@ -1,7 +1,9 @@
 #include "cli/left_out.h"
 
+#include <algorithm>
 #include <cstdio>
 
+#include "cli/ask.h"
 #include "cli/command.h"
 #include "cli/escape.h"
 #include "cli/format.h"
@@ -57,8 +59,22 @@ void LeftOut::AddFrom(const Json::Value& reply) {
   for (const Json::Value& entry : reply) {
     const std::string share = ShareOf(TextOf(entry, "id"));
     const auto code = static_cast<int>(IntOf(entry, "code"));
-    Add(share, code, WhyUnusable(share, code, TextOf(entry, "reason")));
+    Add(share, code, WhyUnusable(share, code, TextOf(entry, "reason")), entry["searched"] == true);
   }
+}
+
+bool LeftOut::AddIfRebuilding(const std::string& share) {
+  Json::Value data;
+  data["id"] = GetFileIndexID(share);
+  const Json::Value rebuilding = AskEngine("index_stat", data)["rebuilding"];
+  if (!rebuilding.isObject()) return false;
+  Add(share, 0, "its index is being rebuilt, because " + TextOf(rebuilding, "reason"), true);
+  return true;
+}
+
+size_t LeftOut::Unsearched() const {
+  return static_cast<size_t>(
+      std::count_if(list_.begin(), list_.end(), [](const Json::Value& entry) { return entry["searched"] == false; }));
 }
 
 bool LeftOut::Unless(const std::string& share, const std::function<void()>& run) {
@@ -80,7 +96,8 @@ bool LeftOut::Unless(const std::string& share, const std::function<void()>& run)
 void LeftOut::Tell() const {
   for (const Json::Value& entry : list_) {
     const std::string share = TextOf(entry, "share");
-    (void)fprintf(stderr, "fileindexctl: %s: %s%s\n", entry["searched"].asBool() ? "may not be up to date" : "left out",
+    (void)fprintf(stderr, "fileindexctl: %s: %s%s\n",
+                  entry["searched"].asBool() ? "only what is indexed by now" : "left out",
                   share.empty() ? "" : ("share " + EscapeForTerminal(share) + ": ").c_str(),
                   EscapeOneLine(TextOf(entry, "reason")).c_str());
   }

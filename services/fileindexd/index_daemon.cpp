@@ -116,7 +116,9 @@ void IndexDaemon::Start() {
 void IndexDaemon::Follow() {
   while (!stopping_) {
     configuration_.Wait(configuration_.SeesChanges() ? kSlowTimer : kSlowTimerWithoutWatch);
-    if (!stopping_) Reconcile();
+    if (stopping_) return;
+    Reconcile();
+    workers_.LookAtIndices(SharesBeingRebuilt());
   }
 }
 

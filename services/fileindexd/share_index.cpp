@@ -2,6 +2,7 @@
 
 #include <syslog.h>
 
+#include "common/file_util.h"
 #include "common/json_util.h"
 #include "common/log.h"
 #include "common/paths.h"
@@ -47,6 +48,15 @@ void ThrowIfFailed(const Json::Value& part) {
   throw Error(static_cast<Error::ErrorCode>(code), message);
 }
 
+/// An object; null when it does not answer within `longest`.
+Json::Value AskEngine(const Json::Value& request, std::chrono::milliseconds longest) {
+  std::string text;
+  Json::Value reply;
+  const auto result = services::AskLocally(InstancePath(kElasticdSocket), toString(request), longest, text);
+  const bool answered = result == services::RequestResult::kAnswered && fromString(reply, text) && reply.isObject();
+  return answered ? reply : Json::Value();
+}
+
 class Engine : public ShareIndex {
  public:
   explicit Engine(const std::string& share) : share_(share), id_(elastic::GetFileIndexID(share)) {}
@@ -72,6 +82,20 @@ class Engine : public ShareIndex {
     }
     elastic::ShareIndexDelete(share_);
     elastic::ShareIndexCreate(share_);
+  }
+
+  int64_t Rebuilding() override {
+    Json::Value reply;
+    elastic::SendRequest(reply, Request("index_stat"));
+    long long since = 0;
+    GetJsonValue(since, reply["data"]["rebuilding"], "since", false);
+    return since;
+  }
+
+  void EndRebuilding(int64_t which) override {
+    Json::Value request = Request("index_rebuilt");
+    request["data"]["since"] = Json::Int64(which);
+    elastic::SendRequest(request);
   }
 
   void Resume() override { elastic::ShareIndexResume(share_); }
@@ -126,12 +150,8 @@ class Engine : public ShareIndex {
   }
 
   Json::Value Figures(std::chrono::milliseconds longest) override {
-    std::string text;
-    Json::Value reply;
-    const auto result =
-        services::AskLocally(InstancePath(kElasticdSocket), toString(Request("index_stat")), longest, text);
-    const bool answered = result == services::RequestResult::kAnswered && fromString(reply, text) && reply.isObject();
-    if (!answered || reply["success"] == true) return answered ? reply["data"] : Json::Value();
+    const Json::Value reply = AskEngine(Request("index_stat"), longest);
+    if (reply.isNull() || reply["success"] == true) return reply.isNull() ? reply : reply["data"];
     Json::Value refused;
     refused["error"] = reply["error"];
     return refused;
@@ -176,6 +196,22 @@ class Engine : public ShareIndex {
 };
 
 }  // namespace
+
+std::vector<std::string> SharesBeingRebuilt() {
+  Json::Value request;
+  request["command"] = "index_list";
+  request["data"]["figures"] = false;
+  const std::string prefix = elastic::GetFileIndexID("");
+  std::vector<std::string> shares;
+  const Json::Value reply = AskEngine(request, std::chrono::seconds(2));
+  if (!reply.isObject() || !reply["data"].isArray()) return shares;
+  for (const Json::Value& index : reply["data"]) {
+    std::string id;
+    GetJsonValue(id, index, "id", false);
+    if (index.isMember("rebuilding") && StringStartWith(id, prefix)) shares.push_back(id.substr(prefix.size()));
+  }
+  return shares;
+}
 
 std::unique_ptr<ShareIndex> EngineShareIndex(const std::string& share) { return std::make_unique<Engine>(share); }
 

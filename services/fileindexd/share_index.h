@@ -31,6 +31,11 @@ class ShareIndex {
   virtual bool Exists() = 0;
   /// Makes it when it is missing; replaces one of the same name that lies elsewhere.
   virtual void Create() = 0;
+  /// What tells the present rebuilding of the index, which the engine has made anew and which is to be filled, from
+  /// others; 0 for an index that is complete.
+  virtual int64_t Rebuilding() = 0;
+  /// That rebuilding is complete; nothing happens when another has begun meanwhile.
+  virtual void EndRebuilding(int64_t which) = 0;
   /// Ends a pause of the index.
   virtual void Resume() = 0;
   virtual void Upsert(const std::string& path, bool need_meta) = 0;
@@ -53,6 +58,9 @@ class ShareIndex {
   /// Null when the engine does not answer within `longest`.
   virtual Json::Value Figures(std::chrono::milliseconds longest) = 0;
 };
+
+/// The shares of which the engine says that their index is being rebuilt; none when it does not answer at once.
+std::vector<std::string> SharesBeingRebuilt();
 
 /// The index of `share` in the search engine.
 std::unique_ptr<ShareIndex> EngineShareIndex(const std::string& share);

@@ -156,6 +156,11 @@ void ShareWorker::NoteInner(const std::vector<std::string>& folders) {
   Wake();
 }
 
+void ShareWorker::LookAtIndex() {
+  look_at_index_ = true;
+  Wake();
+}
+
 uint64_t ShareWorker::RequestSync() {
   if (NothingWaits()) return 0;
   const uint64_t request = progress_.Ask();
@@ -179,7 +184,7 @@ std::string ShareWorker::AwaitSync(uint64_t request, QueueProgress::TimePoint en
 
 /// In this order: what leaves the live queue is in the detached one until the index has it.
 bool ShareWorker::NothingWaits() const {
-  if (!settled_ || inner_changes_ != inner_changes_seen_ || HasContent(queue_path_) ||
+  if (!settled_ || look_at_index_ || inner_changes_ != inner_changes_seen_ || HasContent(queue_path_) ||
       IsFileExist(queue_path_ + ".tmp"))
     return false;
   try {
@@ -247,6 +252,7 @@ milliseconds ShareWorker::OnFailure(const Error& error) {
     failing_since_ = steady_clock::now();
   }
   index_exists_ = index_exists_ && error.Code() != Error::kEngineNoSuchIndex;
+  look_at_index_ = true;
   try {
     if (IsOutOfSpace(error, share_)) return OnNoSpace(error);
   } catch (const Error&) {
@@ -331,6 +337,7 @@ void ShareWorker::RunOnce() {
   away_ = false;
   const ShareFolders folders = LoadFolders();
   EnsureIndex();
+  if (look_at_index_.exchange(false)) FollowRebuilding();
   const std::string detached = queue_path_ + ".tmp";
   // A pass looks at the folders of shares in this one that came or went; nobody queues anything for that.
   const bool is_queued = HasContent(queue_path_) || IsFileExist(detached);
@@ -344,6 +351,7 @@ void ShareWorker::RunOnce() {
     RunPass();
     if (!begun_before) progress_.Done(serves_);
   } while (true);
+  FinishRebuilding();
 }
 
 /// A change after a quiet time goes at once; under load, passes come at this distance and so grow with it. Nobody who
@@ -377,6 +385,26 @@ void ShareWorker::EnsureIndex() {
   }
   if (index_->List("", "", 1).empty()) applied_.Forget();
   index_exists_ = true;
+}
+
+/// An index that the engine has made anew holds nothing that the folders want. What it got before this process began is
+/// found in it and not read again.
+void ShareWorker::FollowRebuilding() {
+  const int64_t before = rebuilding_.exchange(index_->Rebuilding());
+  if (rebuilding_ == 0 || rebuilding_ == before) return;
+  Log(LOG_WARNING, "the index of share %s was made anew; it is filled again", share_.c_str());
+  applied_.Set(ShareFolders(), applied_.MountPoint());
+  (void)Queue(fileindex::EVENT_REINDEX, root_);
+}
+
+/// Once a pass has brought the index in line with the folders.
+void ShareWorker::FinishRebuilding() {
+  if (rebuilding_ == 0 || applied_.Get().Count() == 0) return;
+  if (!LoadFolders().DifferingFrom(applied_.Get()).empty()) return;
+  index_->EndRebuilding(rebuilding_);
+  rebuilding_ = 0;
+  look_at_index_ = true;  // another may have begun meanwhile
+  watch_.Wake();
 }
 
 /// The folders are looked at under their lock, so that no index is made for a share whose last folder is being removed.
@@ -578,6 +606,10 @@ Json::Value ShareWorker::Status(std::chrono::milliseconds engine_wait) {
   const int64_t oldest = OldestChange({queue_path_ + ".tmp", queue_path_});
   if (oldest > 0) json["oldest_change"] = Json::Int64(oldest);
   json["index"] = index_->Figures(engine_wait);
+  const Json::Value& index = json["index"];
+  if (index.isObject() && index.isMember("rebuilding") && index["rebuilding"]["since"] != Json::Int64(rebuilding_)) {
+    LookAtIndex();
+  }
   return json;
 }
 

@@ -92,6 +92,8 @@ class ShareWorker {
   /// Which indexed shares lie in this one now; what changes in that is carried out at once. From any thread, one at a
   /// time.
   void NoteInner(const std::vector<std::string>& folders);
+  /// Looks whether the engine has made the index anew, and fills it then. From any thread.
+  void LookAtIndex();
 
   /// Asks that all that is queued now be in the index soon. @return what AwaitSync waits for; 0 when nothing is to be
   /// done. Like AwaitSync, from any thread.
@@ -129,6 +131,8 @@ class ShareWorker {
   void CheckShare();
   void EnsureIndex();
   void MakeMissingIndex();
+  void FollowRebuilding();
+  void FinishRebuilding();
   bool AwaitsEvent();
   void QueueNeededReindex();
   bool HoldsStrays();
@@ -151,6 +155,8 @@ class ShareWorker {
   Environment environment_;
   std::unique_ptr<ShareIndex> index_;
   bool index_exists_ = false;
+  std::atomic<bool> look_at_index_{true};
+  std::atomic<int64_t> rebuilding_{0};  ///< the one that is under way, as ShareIndex tells it
   bool strays_looked_for_ = false;
   AppliedFolders applied_;
   std::optional<std::chrono::steady_clock::time_point> awaits_since_;

@@ -47,11 +47,17 @@ void WorkerSet::SettingChanged(const std::string& share) {
   const std::lock_guard order(order_mutex_);
   commanded_.erase(share);
   ReconcileInOrder();
-  if (const auto worker = Find(share)) worker->Wake();
+  if (const auto worker = Find(share)) worker->LookAtIndex();
 }
 
 void WorkerSet::WakeAll() {
   for (const auto& [share, worker] : Present()) worker->Wake();
+}
+
+void WorkerSet::LookAtIndices(const std::vector<std::string>& shares) const {
+  for (const std::string& share : shares) {
+    if (const auto worker = Find(share)) worker->LookAtIndex();
+  }
 }
 
 WorkerSet::Workers WorkerSet::Present() const {

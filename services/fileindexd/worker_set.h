@@ -43,6 +43,8 @@ class WorkerSet {
   void SettingChanged(const std::string& share);
 
   void WakeAll();
+  /// Has the workers of these shares look at what has become of their index.
+  void LookAtIndices(const std::vector<std::string>& shares) const;
   /// Waits until all that is queued now for the shares (none named: for all that have a worker) is in the index, at
   /// most until `end`. @return "", or a sentence for each share for which that cannot be said.
   std::string Sync(const std::vector<std::string>& shares, QueueProgress::TimePoint end) const;

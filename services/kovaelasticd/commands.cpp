@@ -15,6 +15,7 @@ constexpr size_t kIdMaxBytes = 512;
 constexpr size_t kPathMaxBytes = 8192;
 /// A longer list of documents is to be asked for in pages.
 constexpr int64_t kListMaxBytes = 128 << 20;
+constexpr int64_t kMaxInt = std::numeric_limits<int64_t>::max();
 
 [[noreturn]] void RefuseMember(const char* name, const std::string& must_be) {
   throw Error(Error::kEngineBadRequest, "\"" + std::string(name) + "\" must be " + must_be);
@@ -64,6 +65,22 @@ Json::Value OnIndexDelete(CommandCall& call) {
   return {};
 }
 
+Json::Value OnIndexRebuild(CommandCall& call) {
+  call.registry.Rebuild(IndexId(call.data));
+  return {};
+}
+
+Json::Value OnIndexRebuilt(CommandCall& call) {
+  call.registry.EndRebuild(IndexId(call.data), OptionalInt(call.data, "since", 0, 0, kMaxInt));
+  return {};
+}
+
+void AddRebuilding(const RebuildState& state, Json::Value& result) {
+  if (state.Since() == 0) return;
+  result["rebuilding"]["since"] = Json::Int64(state.Since());
+  result["rebuilding"]["reason"] = state.Reason();
+}
+
 Json::Value OnIndexConfigSet(CommandCall& call) {
   const std::string id = IndexId(call.data);
   const Json::Value& changes = RequiredObject(call.data, "data");
@@ -78,13 +95,15 @@ Json::Value OnIndexConfigSet(CommandCall& call) {
 
 Json::Value OnIndexList(CommandCall& call) {
   Json::Value list(Json::arrayValue);
+  const bool figures = OptionalBool(call.data, "figures", true);
   for (const Registry::Listed& listed : call.registry.List()) {
     Json::Value entry;
     entry["id"] = listed.id;
     entry["path"] = listed.path;
     entry["paused"] = listed.paused;
+    AddRebuilding(listed.rebuild, entry);
     try {
-      if (!listed.paused) {
+      if (figures && !listed.paused) {
         entry["documents"] = Json::Int64(call.registry.Open(listed.id).index->Stat().documents);
       }
     } catch (const Error& error) {
@@ -104,6 +123,7 @@ Json::Value OnIndexStat(CommandCall& call) {
   result["bytes_on_disk"] = Json::Int64(stat.bytes_on_disk);
   result["text_bytes"] = Json::Int64(stat.text_bytes);
   result["uncommitted"] = Json::Int64(open.index->Uncommitted());
+  AddRebuilding(open.rebuild, result);
   result["extract_errors"] = Json::Value(Json::objectValue);
   for (const auto& [reason, count] : stat.extract_errors) result["extract_errors"][reason] = Json::Int64(count);
   result["extract_error_examples"] = Json::Value(Json::objectValue);
@@ -153,7 +173,7 @@ Json::Value OnGetByQuery(CommandCall& call) {
     request.fields.push_back(name.asString());
   }
   request.after = OptionalText(query, "after").value_or("");
-  request.limit = OptionalInt(query, "limit", -1, -1, std::numeric_limits<int64_t>::max());
+  request.limit = OptionalInt(query, "limit", -1, -1, kMaxInt);
   Json::Value list(Json::arrayValue);
   open.index->Read([&](IndexStore& store) {
     int64_t bytes = 0;
@@ -197,6 +217,8 @@ constexpr Command kCommands[] = {{"index_create", &OnIndexCreate, false},
                                  {"index_pause", &OnIndexPause, false},
                                  {"index_resume", &OnIndexResume, false},
                                  {"index_delete", &OnIndexDelete, false},
+                                 {"index_rebuild", &OnIndexRebuild, false},
+                                 {"index_rebuilt", &OnIndexRebuilt, false},
                                  {"index_config_set", &OnIndexConfigSet, false},
                                  {"index_list", &OnIndexList, false},
                                  {"index_stat", &OnIndexStat, false},

@@ -110,6 +110,7 @@ std::string Engine::Handle(const std::string& request, const services::Peer& pee
     text = Answer(request, peer);
     return Json::Value();
   });
+  registry_.HealDamaged();
   return failure.isNull() ? text : toString(failure);
 }
 

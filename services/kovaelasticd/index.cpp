@@ -6,6 +6,7 @@
 
 #include "common/log.h"
 #include "common/unique_fd.h"
+#include "services/kovaelasticd/sqlite_db.h"
 
 namespace ferrox::engine {
 
@@ -18,14 +19,29 @@ constexpr char kLostText[] =
 
 }  // namespace
 
-Index::Index(std::unique_ptr<IndexStore> store, std::string marker_path, std::chrono::milliseconds auto_commit_after)
-    : store_(std::move(store)), marker_path_(std::move(marker_path)), auto_commit_after_(auto_commit_after) {
+Index::Index(std::unique_ptr<IndexStore> store, std::string marker_path, std::chrono::milliseconds auto_commit_after,
+             std::function<void()> on_damage)
+    : store_(std::move(store)),
+      marker_path_(std::move(marker_path)),
+      auto_commit_after_(auto_commit_after),
+      on_damage_(std::move(on_damage)) {
   lost_ = access(marker_path_.c_str(), F_OK) == 0;
   marked_ = lost_;
   thread_ = std::thread(&Index::ThreadMain, this);
 }
 
 Index::~Index() { Close(); }
+
+/// What the store does; that its file is damaged is told.
+template <typename Run>
+auto Index::Watched(Run run) {
+  try {
+    return run();
+  } catch (const IndexDamaged&) {
+    on_damage_();
+    throw;
+  }
+}
 
 void Index::Write(const Job& job) { Submit(Kind::kWrite, &job); }
 
@@ -48,13 +64,13 @@ void Index::Submit(Kind kind, const Job* job) {
 SearchReply Index::Search(const SearchRequest& request) {
   const std::shared_lock<std::shared_mutex> guard(store_mutex_);
   if (store_ == nullptr) throw Error(Error::kEngineIndexPaused, "the index was closed meanwhile; resume it");
-  return store_->Search(request);
+  return Watched([&] { return store_->Search(request); });
 }
 
 StoreStat Index::Stat() {
   const std::shared_lock<std::shared_mutex> guard(store_mutex_);
   if (store_ == nullptr) throw Error(Error::kEngineIndexPaused, "the index was closed meanwhile; resume it");
-  return store_->Stat();
+  return Watched([&] { return store_->Stat(); });
 }
 
 void Index::Close() {
@@ -110,11 +126,7 @@ void Index::ThreadMain() {
 
 void Index::Execute(Task& task) {
   try {
-    if (task.kind == Kind::kRead) {
-      (*task.job)(*store_);
-    } else {
-      RunChange(task);
-    }
+    Watched([&] { task.kind == Kind::kRead ? (*task.job)(*store_) : RunChange(task); });
   } catch (...) {
     task.failure = std::current_exception();
   }
@@ -147,7 +159,7 @@ void Index::LoseChanges() {
 
 void Index::CommitStore() {
   try {
-    store_->Commit();
+    Watched([&] { store_->Commit(); });
   } catch (...) {
     LoseChanges();
     throw;

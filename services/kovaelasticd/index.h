@@ -27,9 +27,11 @@ class Index {
   static constexpr std::chrono::milliseconds kAutoCommitAfter{5000};
   static constexpr int64_t kAutoCommitBytes = 64 << 20;
 
-  /// `marker_path` is the file that exists while there are uncommitted changes.
-  Index(std::unique_ptr<IndexStore> store, std::string marker_path,
-        std::chrono::milliseconds auto_commit_after = kAutoCommitAfter);
+  /// `marker_path` is the file that exists while there are uncommitted changes. `on_damage` is called, by any thread,
+  /// when the store finds its file damaged.
+  Index(
+      std::unique_ptr<IndexStore> store, std::string marker_path,
+      std::chrono::milliseconds auto_commit_after = kAutoCommitAfter, std::function<void()> on_damage = [] {});
   Index(const Index&) = delete;
   Index& operator=(const Index&) = delete;
   /// Commits and closes.
@@ -71,11 +73,14 @@ class Index {
   void LoseChanges();
   void Mark();
   void Unmark();
+  template <typename Run>
+  auto Watched(Run run);
 
   std::shared_mutex store_mutex_;  ///< shared: uses the store; exclusive: closes it
   std::unique_ptr<IndexStore> store_;
   const std::string marker_path_;
   const std::chrono::milliseconds auto_commit_after_;
+  const std::function<void()> on_damage_;
 
   std::mutex mutex_;
   std::condition_variable wake_thread_;

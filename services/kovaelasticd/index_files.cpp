@@ -1,14 +1,83 @@
 #include "services/kovaelasticd/index_files.h"
 
+#include <dirent.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include <cerrno>
+#include <ctime>
+#include <memory>
+#include <vector>
 
 #include "common/file_util.h"
 #include "common/log.h"
 #include "services/support/daemon.h"
 
 namespace ferrox::engine {
+
+namespace {
+
+constexpr char kSetAside[] = ".damaged-";
+
+std::string ParentOf(const std::string& path) { return Dirname(path).empty() ? "/" : Dirname(path); }
+
+std::vector<std::string> SetAsideOf(const std::string& path) {
+  std::vector<std::string> found;
+  const std::unique_ptr<DIR, int (*)(DIR*)> folder(opendir(ParentOf(path).c_str()), &closedir);
+  if (folder == nullptr) return found;
+  while (const dirent* entry = readdir(folder.get())) {
+    if (StringStartWith(entry->d_name, Basename(path) + kSetAside))
+      found.push_back(ParentOf(path) + "/" + entry->d_name);
+  }
+  return found;
+}
+
+std::string Day(int64_t now) {
+  const time_t seconds = now;
+  struct tm local = {};
+  char text[16] = {};
+  if (localtime_r(&seconds, &local) == nullptr || strftime(text, sizeof(text), "%Y-%m-%d", &local) == 0) return "?";
+  return text;
+}
+
+}  // namespace
+
+bool IsIndexFileLost(const std::string& folder) {
+  struct stat status = {};
+  if (lstat(IndexFile(folder).c_str(), &status) != 0) return errno == ENOENT;
+  return S_ISREG(status.st_mode) && status.st_size == 0 && !IsFileExist(IndexFile(folder) + "-wal");
+}
+
+std::string MountPointOf(const std::string& path) {
+  std::string at = path;
+  struct stat here = {};
+  while (at != "/" && stat(at.c_str(), &here) != 0) at = ParentOf(at);
+  struct stat above = {};
+  while (at != "/" && stat(at.c_str(), &here) == 0 && stat(ParentOf(at).c_str(), &above) == 0 &&
+         above.st_dev == here.st_dev) {
+    at = ParentOf(at);
+  }
+  return at;
+}
+
+void RemoveSetAside(const std::string& path) {
+  for (const std::string& kept : SetAsideOf(path)) (void)Unlink(kept);
+}
+
+void SetAside(const std::string& path, int64_t now) {
+  if (!IsFileExist(path)) return;
+  RemoveSetAside(path);
+  const std::string kept = path + kSetAside + Day(now);
+  FERROX_FAIL_IF(chmod(path.c_str(), 0600) != 0 || rename(path.c_str(), kept.c_str()) != 0, Error::kEngineStorage,
+                 "cannot set " + path + " aside: " + ErrnoText());
+  SyncIndexFolder(ParentOf(path));
+}
+
+void SetAsideIndexFiles(const std::string& folder, int64_t now) {
+  if (!IsIndexFileLost(folder)) SetAside(IndexFile(folder), now);
+  for (const char* suffix : {"-wal", "-shm"}) (void)Unlink(IndexFile(folder) + suffix);
+  (void)Unlink(MarkerFile(folder));
+}
 
 std::string IndexFile(const std::string& folder) { return folder + "/index.sqlite"; }
 
@@ -30,6 +99,7 @@ void RemoveIndexFiles(const std::string& folder) {
     FERROX_FAIL_IF(!Unlink(path), Error::kEngineStorage, "cannot remove " + path + ": " + ErrnoText());
   }
   (void)Unlink(MarkerFile(folder));
+  RemoveSetAside(IndexFile(folder));
   (void)rmdir(folder.c_str());  // other files in it are not ours
 }
 

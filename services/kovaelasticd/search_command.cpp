@@ -19,6 +19,8 @@ constexpr int64_t kLimitMax = 1000;
 /// Who wants to see more hits narrows the query.
 constexpr int64_t kLastHitMax = 100000;
 constexpr size_t kMarkMaxBytes = 64;
+/// In "left_out" alone: the index was searched, but does not hold all yet.
+constexpr int kIndexRebuilding = 1410;
 
 struct IndexHit {
   std::string index_id;
@@ -70,15 +72,20 @@ struct AskedIndices {
   Json::Value left_out{Json::arrayValue};
 };
 
+void AddLeftOut(AskedIndices& asked, const std::string& id, int code, const std::string& reason, bool searched) {
+  Json::Value entry;
+  entry["id"] = id;
+  entry["code"] = code;
+  entry["reason"] = reason;
+  entry["searched"] = searched;
+  asked.left_out.append(std::move(entry));
+}
+
 /// Notes the index among those that were not searched, so that nobody takes what was found for all that there is. What
 /// is wrong with the request itself fails it.
 void LeaveOut(AskedIndices& asked, const std::string& id, const Error& error) {
   if (id == asked.required || error.Code() == Error::kEngineBadRequest) throw Error(error);
-  Json::Value entry;
-  entry["id"] = id;
-  entry["code"] = error.Code();
-  entry["reason"] = error.what();
-  asked.left_out.append(std::move(entry));
+  AddLeftOut(asked, id, error.Code(), error.what(), false);
 }
 
 AskedIndices ReadIndices(CommandCall& call) {
@@ -162,6 +169,9 @@ std::vector<IndexHit> SearchAll(AskedIndices& asked, const SearchRequest& reques
       std::vector<IndexHit>& hits = of_index.emplace_back();
       for (SearchHit& hit : reply.hits) hits.push_back({open.id, std::move(hit)});
       for (std::string& word : reply.suggestions) sums.suggestions.push_back(std::move(word));
+      if (open.rebuild.Since() == 0) continue;
+      AddLeftOut(asked, open.id, kIndexRebuilding, "it is being rebuilt, because " + open.rebuild.Reason(),
+                 true);
     } catch (const Error& error) {
       LeaveOut(asked, open.id, error);
     }

@@ -6,15 +6,19 @@ namespace ferrox::engine {
 
 namespace {
 
+bool IsDamage(int result) { return (result & 0xFF) == SQLITE_CORRUPT || (result & 0xFF) == SQLITE_NOTADB; }
+
 std::string Remedy(int result) {
   switch (result & 0xFF) {
     case SQLITE_FULL:
       return "the disk is full; free space and try again";
     case SQLITE_CORRUPT:
     case SQLITE_NOTADB:
-      return "the file is damaged or no index of this engine; move it away and index the share again";
+      return "the file is damaged; the index is made anew";
     case SQLITE_CANTOPEN:
       return "it cannot be opened; check that the folder exists and belongs to the engine's user";
+    case SQLITE_IOERR:
+      return "it cannot be read or written; when that stays so, look at the disk; the system log tells more";
     default:
       return std::string(sqlite3_errstr(result)) + "; the system log tells more";
   }
@@ -114,7 +118,10 @@ int64_t Database::QueryInt(const char* sql) {
 void Database::Fail(int result) {
   const char* detail = handle_ != nullptr ? sqlite3_errmsg(handle_.get()) : "";
   const std::string reason = "index file " + path_ + ": " + Remedy(result);
-  ::ferrox::Fail({__FILE__, __LINE__, __func__, detail}, 0, Error::kEngineStorage, reason);
+  const FailSite site = {__FILE__, __LINE__, __func__, detail};
+  if (!IsDamage(result)) ::ferrox::Fail(site, 0, Error::kEngineStorage, reason);
+  LogFailure(site, 0, reason);
+  throw IndexDamaged(reason);
 }
 
 }  // namespace ferrox::engine

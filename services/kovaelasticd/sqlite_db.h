@@ -8,7 +8,15 @@
 #include <string_view>
 #include <unordered_map>
 
+#include "common/error.h"
+
 namespace ferrox::engine {
+
+/// Of SQLite's failures the one that time does not mend: the file's content is damaged, or no database.
+class IndexDamaged : public Error {
+ public:
+  explicit IndexDamaged(const std::string& reason) : Error(Error::kEngineStorage, reason) {}
+};
 
 class Database;
 
@@ -70,7 +78,7 @@ class Database {
 
   sqlite3* Handle() { return handle_.get(); }
   const std::string& Path() const { return path_; }
-  /// Logs and throws what the last call's result means for the index.
+  /// Logs and throws what the last call's result means for the index; IndexDamaged where that is it.
   [[noreturn]] void Fail(int result);
   void Check(int result) {
     if (result != SQLITE_OK) [[unlikely]]

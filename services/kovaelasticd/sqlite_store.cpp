@@ -93,12 +93,12 @@ void SqliteStore::CheckFormat() {
   const bool ours = writer_.QueryInt("PRAGMA application_id") == kApplicationId;
   FERROX_FAIL_IF(
       !ours, Error::kEngineStorage,
-      "index file " + writer_.Path() + ": it is no index of this engine; move it away and index the share again");
+      "index file " + writer_.Path() + ": it is no index of this engine; 'fileindexctl rebuild' makes it anew");
   const int64_t version = writer_.QueryInt("PRAGMA user_version");
   FERROX_FAIL_IF(version != kFormatVersion, Error::kEngineStorage,
                  "index file " + writer_.Path() + ": it has format " + std::to_string(version) +
                      ", this engine reads format " + std::to_string(kFormatVersion) +
-                     "; remove it and index the share again");
+                     "; use the engine that wrote it, or 'fileindexctl rebuild', which makes it anew");
 }
 
 void SqliteStore::Begin() {

@@ -264,7 +264,7 @@ class ToolTest(unittest.TestCase):
         write_json(f"{self.root}/etc/kova/shares.json",
                    [{"name": name, "path": f"{self.root}/vol/{name}"} for name in ("gone", "photo", "photos")])
         paused = {"success": False, "error": {"code": 1409, "msg": "paused"}}
-        self.daemon("kovaelasticd", ping=success({}), commit=success(None), document_get_by_query=lambda data: paused
+        self.daemon("kovaelasticd", ping=success({}), index_stat=success({}), document_get_by_query=lambda data: paused
                     if data["id"] == "fileindex_photo" else success([{"KOVAMDPath": "/v/bad", "_KOVAExtractError": "torn"}]))
         for words, found in ((["unread"], b"/v/bad"), (["show", "/photo/trip/a", "/photos/a b/c"], b"/v/bad")):
             done = self.run_tool(*words)

@@ -3,62 +3,13 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
-#include <filesystem>
-#include <memory>
 #include <set>
-#include <string>
 #include <vector>
 
-#include <gtest/gtest.h>
-
-#include "common/error.h"
-#include "common/json_util.h"
-#include "tests/support/temp_dir.h"
+#include "tests/engine/engine_fixture.h"
 
 namespace ferrox::engine {
 namespace {
-
-class EngineTest : public testing::Test {
- protected:
-  EngineTest() {
-    std::filesystem::create_directories(folder_ / "state");
-    Restart();
-  }
-  void Restart() {
-    engine_.reset();
-    engine_ = std::make_unique<Engine>(folder_ / "state");
-  }
-  Json::Value SendText(const std::string& request, uid_t uid = 0) {
-    Json::Value reply;
-    EXPECT_TRUE(fromString(reply, engine_->Handle(request, {uid, 0, 0})));
-    return reply;
-  }
-  Json::Value Send(const std::string& command, const std::string& data = "{}") {
-    return SendText(R"({"command":")" + command + R"(","data":)" + data + "}");
-  }
-  /// The code of the failure, 0 for success.
-  int Code(const std::string& command, const std::string& data) { return CodeOf(Send(command, data)); }
-  static int CodeOf(const Json::Value& reply) {
-    if (reply["success"].asBool()) return 0;
-    EXPECT_GT(reply["error"]["msg"].asString().size(), 15U) << toString(reply);
-    return reply["error"]["code"].asInt();
-  }
-  int Create(const std::string& id, const std::string& name) {
-    return Code("index_create", R"({"id":")" + id + R"(","path":")" + (folder_ / name) + "\"}");
-  }
-  int Put(const std::string& id, const std::string& path, const std::string& text) {
-    return Code("document_upsert_by_id",
-                R"({"id":")" + id + R"(","doc_id":")" + path + R"(","data":{"KOVAMDTextContent":")" + text + "\"}}");
-  }
-  int Commit(const std::string& id) { return Code("commit", R"({"id":")" + id + "\"}"); }
-  int64_t Total(const std::string& query, const std::string& id = "") {
-    const std::string where = id.empty() ? "" : R"(,"id":")" + id + "\"";
-    return Send("search", R"({"query":")" + query + "\"" + where + "}")["data"]["total"].asInt64();
-  }
-
-  test::TempDir folder_;
-  std::unique_ptr<Engine> engine_;
-};
 
 TEST_F(EngineTest, BadRequestsAreAnsweredWithTheirCode) {
   ASSERT_EQ(Create("a", "a"), 0);
@@ -200,13 +151,15 @@ TEST_F(EngineTest, IndicesPauseMoveRenameAndGo) {
   EXPECT_EQ(Total("lantern"), 0);
 }
 
-TEST_F(EngineTest, ADamagedIndexDoesNotHideTheOthers) {
+TEST_F(EngineTest, AnUnusableIndexDoesNotHideTheOthers) {
   ASSERT_EQ(Create("good", "good"), 0);
   ASSERT_EQ(Create("bad", "bad"), 0);
   ASSERT_EQ(Put("good", "/v/1", "lantern"), 0);
   ASSERT_EQ(Commit("good"), 0);
   engine_.reset();
-  test::WriteFile(folder_ / "bad/index.sqlite", std::string(100000, 'x'));
+  std::string newer = test::ReadFile(folder_ / "bad/index.sqlite");
+  newer[63] = 99;  // the user version
+  test::WriteFile(folder_ / "bad/index.sqlite", newer);
   Restart();
   const Json::Value reply = Send("search", R"({"id":"bad","query":"lantern"})");
   EXPECT_EQ(CodeOf(reply), 1407);

@@ -36,6 +36,11 @@ class FakeIndex : public indexd::ShareIndex {
     ++creations;
   }
 
+  int64_t Rebuilding() override { return rebuilding; }
+  void EndRebuilding(int64_t which) override {
+    if (which == rebuilding) rebuilding = 0;
+  }
+
   void Resume() override { paused = false; }
   void Upsert(const std::string& path, bool need_meta) override {
     if (before_read) before_read(path);
@@ -124,6 +129,7 @@ class FakeIndex : public indexd::ShareIndex {
   std::mutex mutex;
   bool exists = true;
   std::atomic<bool> paused{false};
+  std::atomic<int64_t> rebuilding{0};
   std::map<std::string, Document> documents;
   std::set<std::string> suspects;
   std::map<std::string, int> upserts;

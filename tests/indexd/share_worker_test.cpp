@@ -259,6 +259,32 @@ TEST_F(ShareWorkerTest, MissingIndexIsMadeAfterAWhileAndFilled) {
   EXPECT_EQ(Expected(), Indexed());
 }
 
+TEST_F(ShareWorkerTest, AnIndexThatWasMadeAnewIsFilledAndSaidToBeComplete) {
+  for (int i = 0; i < 50; ++i) test::WriteFile(At("f" + std::to_string(i)), "x");
+  Process(Line(kReindex, root));
+  for (const bool again : {false, true}) {
+    index->documents.clear();
+    index->rebuilding = again ? 3 : 1;
+    bool met = again;
+    index->before_write = [&](const std::string&) {
+      if (!std::exchange(met, true)) index->rebuilding = 2;  // once more, unseen by what is under way
+    };
+    worker->LookAtIndex();
+    worker->RunOnce();
+    EXPECT_EQ(Expected(), Indexed());
+    EXPECT_EQ(again ? 0 : 2, index->rebuilding) << "of another one nothing is said yet";
+    worker->RunOnce();
+    EXPECT_EQ(0, index->rebuilding);
+  }
+  index->upserts.clear();
+  index->rebuilding = 4;
+  Restart();
+  index->rebuilding = 4;
+  worker->RunOnce();
+  EXPECT_EQ(0, index->rebuilding);
+  EXPECT_TRUE(index->upserts.empty()) << "what it holds is not read again";
+}
+
 TEST_F(ShareWorkerTest, PausedIndexIsResumedWhenNoFolderIsPaused) {
   index->paused = true;
   Configure(share, {{"", "davp"}}, true);

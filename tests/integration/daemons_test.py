@@ -1,6 +1,7 @@
 """The daemons and the tool together, as a person meets them."""
 
 import fcntl
+import glob
 import json
 import os
 import pathlib
@@ -87,6 +88,37 @@ class DaemonsTest(InstanceTestCase):
         self.ctl("index", "docs", "--wait")
         self.expect_index_is_disk(folder)
         self.assertEqual(1, len(self.instance.search("number2999")))
+
+    def test_damaged_or_lost_index_is_filled_again_and_the_list_of_indices_reads_nothing(self):
+        folder = self.up_with_share(300)
+        self.ctl("folder", "set", "/docs", "--kinds", "document,photo")
+        self.ctl("index", "docs", "--wait")
+        (index,) = glob.glob(f"{self.instance.root}/var/lib/kova/fileindex/db/*/index.sqlite")
+        folders = self.instance.folders()
+
+        def expect_healed():
+            wait_for(lambda: self.instance.run("search", "number7").returncode == 0, "the index to be complete")
+            self.expect_index_is_disk(folder)
+            self.assertEqual([], glob.glob(index + ".damaged-*"))
+            self.assertEqual(folders, self.instance.folders())
+
+        os.unlink(index)
+        self.assertEqual([], self.instance.search("number7", left_out=["docs"]))
+        expect_healed()
+        self.ctl("down")
+        write(index, b"garbage" * 10000)
+        self.ctl("up")
+        expect_healed()
+        self.ctl("rebuild", "docs", "--wait")
+        expect_healed()
+        indices = f"{self.instance.root}/var/lib/kova/kovaelasticd/indices.json"
+        for damaged in ([indices], [indices, indices + ".copy"]):
+            self.ctl("down")
+            for path in damaged:
+                os.truncate(path, 20)
+            self.ctl("up")
+            expect_healed()
+            self.assertEqual(0, self.instance.status()["index_daemon"]["read"])
 
     def test_pause_stops_at_once_and_resume_goes_on(self):
         folder = self.up_in_the_middle_of_indexing()

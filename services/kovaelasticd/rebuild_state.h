@@ -1,0 +1,44 @@
+#pragma once
+
+#include <cstdint>
+#include <string>
+#include <vector>
+
+#include <json/value.h>
+
+namespace ferrox::engine {
+
+/// That an index was made anew, since its file was damaged or lost, and is not yet full again; and how often that was
+/// so lately. A disk that damages one file after the other must not be read for ever.
+class RebuildState {
+ public:
+  /// So many in a day are made without being asked for.
+  static constexpr size_t kInADay = 2;
+
+  /// What Begin gave; 0 for an index that is complete.
+  int64_t Since() const { return since_; }
+  /// Why it is made anew, the end of a sentence.
+  const std::string& Reason() const { return reason_; }
+  /// Whether its new file may not be there yet.
+  bool Unmade() const { return since_ != 0 && !made_; }
+
+  /// Whether one more may begin at this time, in seconds since the epoch.
+  bool MayBegin(int64_t now) const;
+  /// Begins one. `asked`: somebody did, and what was before no longer counts.
+  void Begin(int64_t now, const std::string& reason, bool asked);
+  void SetMade(bool made) { made_ = made; }
+  void End() { since_ = 0; }
+
+  /// Null for an index that never was.
+  Json::Value ToJson() const;
+  /// @throws Error kBadArgument.
+  static RebuildState FromJson(const Json::Value& stored);
+
+ private:
+  int64_t since_ = 0;
+  std::string reason_;
+  bool made_ = true;
+  std::vector<int64_t> times_;  ///< when those began that nobody asked for
+};
+
+}  // namespace ferrox::engine
