@@ -11,8 +11,9 @@
 /// No exception of the JSON library leaves any of these functions.
 namespace ferrox {
 
-/// Parses one JSON value that makes up the whole text; blanks around it are allowed, comments are not.
-/// False, with `value` null, for anything else: also for text after the value and nesting deeper than 1000.
+/// Parses one JSON value that makes up the whole text; blanks around it are allowed. False, with `value` null, for
+/// anything else: also for text after the value, nesting deeper than 1000, and comments, except where the JSON library
+/// passes over them: in an object before and behind a member, in an array behind an element.
 FERROX_EXPORT bool fromString(Json::Value& value, const std::string& text);
 /// The value as one line. UTF-8, and any other byte, stays as it is.
 FERROX_EXPORT std::string toString(const Json::Value& value);

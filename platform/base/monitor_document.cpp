@@ -34,7 +34,27 @@ std::string WatchProblem(const Json::Value& watch) {
   return {};
 }
 
+bool EndsInSlash(const Json::Value& watch) {
+  if (!watch.isObject() || !watch["path"].isString()) return false;
+  const std::string path = watch["path"].asString();
+  return path.size() > 1 && path.front() == '/' && path.back() == '/';
+}
+
 }  // namespace
+
+Json::Value WithoutTrailingSlashes(const Json::Value& document, std::vector<std::string>& left_out) {
+  if (!document.isObject() || !document["config"].isArray()) return document;
+  Json::Value kept = document;
+  kept["config"] = Json::Value(Json::arrayValue);
+  for (const Json::Value& watch : document["config"]) {
+    if (EndsInSlash(watch)) {
+      left_out.push_back(watch["path"].asString());
+    } else {
+      kept["config"].append(watch);
+    }
+  }
+  return kept;
+}
 
 std::string MonitorDocumentProblem(const Json::Value& document) {
   if (!document.isObject()) return "the registration is not an object";

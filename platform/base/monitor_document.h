@@ -1,6 +1,7 @@
 #pragma once
 
 #include <string>
+#include <vector>
 
 #include <json/value.h>
 
@@ -8,5 +9,9 @@ namespace kova {
 
 /// What keeps `document` from being a registration of kova/notifyd.h; empty when nothing does.
 std::string MonitorDocumentProblem(const Json::Value& document);
+
+/// The registration without the folders whose path ends in "/", as a list that people write may have them: they alone
+/// are not watched. Their paths are appended to `left_out`. What is no registration comes back as it is.
+Json::Value WithoutTrailingSlashes(const Json::Value& document, std::vector<std::string>& left_out);
 
 }  // namespace kova

@@ -24,6 +24,7 @@
 #include "platform/host/detached_process.h"
 #include "platform/host/files.h"
 #include "platform/host/log.h"
+#include "platform/host/service_log.h"
 
 namespace kova::host {
 
@@ -181,6 +182,7 @@ int StartLocked(const ServiceRow& service, const std::string& program) {
     if (found != Found::kGone) return found == Found::kAnswers ? 0 : DoesNotAnswer(service);
   }
   const std::string log_path = ServiceLogPath(service.program);
+  BoundLog(log_path);
   const std::streamoff log_from = FileSize(log_path);
   const pid_t pid = StartDetached(program, log_path);
   if (pid < 0) return ServiceFailure(KOVA_ERR_SYSTEM, "cannot run " + program + ": " + strerror(errno));

@@ -4,7 +4,6 @@
 #include <linux/close_range.h>
 #include <poll.h>
 #include <signal.h>
-#include <sys/stat.h>
 #include <sys/syscall.h>
 #include <sys/wait.h>
 #include <unistd.h>
@@ -19,8 +18,6 @@
 namespace kova::host {
 
 namespace {
-
-constexpr off_t kLogMaxBytes = 16 << 20;
 
 /// What the new process tells its starter: who it is, and why it could not become the program (0: it did).
 struct StartReport {
@@ -95,8 +92,6 @@ pid_t ReadReports(int fd) {
 
 int OpenLog(const std::string& path) {
   if (!MakeFolders(FolderOf(path), 0755)) return -1;
-  struct stat info = {};
-  if (stat(path.c_str(), &info) == 0 && info.st_size > kLogMaxBytes) (void)rename(path.c_str(), (path + ".1").c_str());
   return open(path.c_str(), O_WRONLY | O_CREAT | O_APPEND | O_CLOEXEC | O_NOFOLLOW, 0640);
 }
 

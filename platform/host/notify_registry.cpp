@@ -148,10 +148,17 @@ namespace KOVA::KOVANOTIFYD {
 using namespace kova::host;
 
 bool MonitorQueue::Upsert(const MonitorQueue& queue, const std::string& application, int type) {
-  std::string problem = kova::MonitorDocumentProblem(queue.Document());
+  std::vector<std::string> left_out;
+  const Json::Value document = kova::WithoutTrailingSlashes(queue.Document(), left_out);
+  std::string problem = kova::MonitorDocumentProblem(document);
   if (!problem.empty()) return Refuse(KOVA_ERR_BAD_PARAMETER, "nothing is registered: " + problem);
-  const Key key = {queue.Document()["queue"].asString(), application, type};
-  const std::string text = ToText(ToJson(queue.Document(), key));
+  const Key key = {document["queue"].asString(), application, type};
+  for (const std::string& path : left_out) {
+    LogChange(LOG_ERR, "left out " + key.queue + " " + path,
+              "the folder " + path + " is not watched for " + key.queue +
+                  ": its path ends in \"/\"; correct it in the list of folders");
+  }
+  const std::string text = ToText(ToJson(document, key));
   problem = KeyProblem(key);
   if (problem.empty() && text.size() > kFileMaxBytes) problem = "the registration of " + key.queue + " is too large";
   if (!problem.empty()) return Refuse(KOVA_ERR_BAD_PARAMETER, problem);

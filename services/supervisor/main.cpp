@@ -10,6 +10,7 @@
 
 #include "common/log.h"
 #include "platform/host/child_service.h"
+#include "platform/host/service_log.h"
 #include "services/support/daemon.h"
 
 namespace {
@@ -35,6 +36,7 @@ class Watched {
   explicit Watched(const ServiceRow& service) : service_(&service) {}
 
   void Look() {
+    kova::host::BoundLog(kova::host::ServiceLogPath(service_->program));
     if (SteadyClock::now() < next_ || !kova::host::HasChildServiceDied(*service_)) return;
     if (SteadyClock::now() - next_ > kPauseMax) pause_ = kPauseMin;
     ferrox::Log(LOG_WARNING, "%s ended without having been stopped, and is started again", service_->program);

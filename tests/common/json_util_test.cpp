@@ -63,11 +63,13 @@ TEST(JsonUtilDeathTest, TextThatMemoryIsTooShortForIsNoText) {
 
 TEST(JsonTextTest, OneValueIsTheWholeText) {
   Json::Value value;
-  for (const char* good : {"{}", " [1] \n", "null", "7", "\"x\"", "{\"a\":\"\xff\xfe raw\"}"}) {
+  for (const char* good : {"{}", " [1] \n", "null", "7", "\"x\"", "{\"a\":\"\xff\xfe raw\"}", "[1 /*c*/]",
+                           "[1 /*c*/, 2]", "{/*c*/}", "{/*c*/\"a\":1}", "{\"a\":1 /*c*/, // c\n \"b\":1}"}) {
     EXPECT_TRUE(fromString(value, good)) << good;
   }
   for (const std::string& bad :
-       std::vector<std::string>{"", "{}x", "{} {}", "{'a':1}", "[1,]", "// c\n1", std::string(2000, '[')}) {
+       std::vector<std::string>{"", "{}x", "{} {}", "{'a':1}", "[1,]", "// c\n1", "1 // c", "[/*c*/]", "[/*c*/1]",
+                                "{\"a\" /*c*/:1}", "{\"a\":/*c*/1}", std::string(2000, '[')}) {
     value = 1;
     EXPECT_FALSE(fromString(value, bad)) << bad;
     EXPECT_TRUE(value.isNull()) << bad;

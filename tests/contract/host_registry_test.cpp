@@ -77,6 +77,11 @@ TEST_F(HostRegistryTest, OnlyAChangeIsWritten) {
   WriteFile(file + ".Xy12ab", "half of somethi");
   EXPECT_EQ(1U, ReadRegistrations().list.size());
   EXPECT_TRUE(ReadRegistrations().problems.empty()) << "what a killed writer leaves is no registration";
+  Json::Value by_hand = Document("/q/a", 2);
+  by_hand["config"][0]["path"] = "/v/share/trip/";
+  ASSERT_TRUE(MonitorQueue::Upsert(MonitorQueue(by_hand), "fileindex", 1));
+  EXPECT_EQ(1U, ReadRegistrations().list[0].watches.size());
+  EXPECT_EQ(1, HostLog::Count("the folder /v/share/trip/ is not watched for /q/a: its path ends in"));
 }
 
 TEST_F(HostRegistryTest, ADamagedFileIsNamedAndKept) {

@@ -6,6 +6,7 @@
 
 #include <algorithm>
 #include <filesystem>
+#include <fstream>
 #include <string>
 #include <thread>
 #include <vector>
@@ -17,6 +18,7 @@
 
 #include "platform/base/frames.h"
 #include "platform/host/child_service.h"
+#include "platform/host/service_log.h"
 #include "tests/support/temp_dir.h"
 
 namespace ferrox::test {
@@ -46,6 +48,17 @@ class HostServiceTest : public testing::Test {
 
   TempDir programs_;
 };
+
+TEST_F(HostServiceTest, ALogThatIsWrittenToStaysBounded) {
+  const string path = programs_ / "daemon.log";
+  std::ofstream log(path, std::ios::app);
+  log << string((16 << 20) + 1, 'x') << std::flush;
+  kova::host::BoundLog(path);
+  log << "next\n" << std::flush;
+  kova::host::BoundLog(path);
+  EXPECT_EQ("next\n", ReadFile(path));
+  EXPECT_EQ((16U << 20) + 1, std::filesystem::file_size(path + ".1"));
+}
 
 TEST_F(HostServiceTest, StartedMeansThatItAnswers) {
   EXPECT_EQ(0, KLIBServiceIsRunning(kEngine));

@@ -239,7 +239,8 @@ TEST_F(PlatformContractTest, AQueueIsRegisteredByItsPathApplicationAndType) {
   EXPECT_EQ((std::multiset<string>{"fileindex 1 /v/q: /v/a " + odd,
                                    "other 1 /v/q:", "fileindex 2 /v/q:", "fileindex 1 " + odd + ":"}),
             Registered());
-  EXPECT_TRUE(Register(MonitorDocument("/v/q", {"/v/b"}))) << "in place of the first";
+  EXPECT_TRUE(Register(MonitorDocument("/v/q", {"/v/b", "/v/c/"})))
+      << "in place of the first, without what cannot be watched";
   EXPECT_TRUE(MonitorQueue::Delete("/v/q", "other", kType));
   EXPECT_TRUE(MonitorQueue::Delete("/v/q", "other", kType)) << "there is none any more";
   EXPECT_TRUE(MonitorQueue::Delete("/v/q", "fileindex", 2));

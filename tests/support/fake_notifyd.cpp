@@ -18,7 +18,8 @@ std::string CallArguments(const std::string& queue_path, const std::string& appl
 }  // namespace
 
 bool MonitorQueue::Upsert(const MonitorQueue& queue, const std::string& application, int type) {
-  const Json::Value& document = queue.Document();
+  std::vector<std::string> left_out;
+  const Json::Value document = kova::WithoutTrailingSlashes(queue.Document(), left_out);
   const bool named = document.isObject() && document["queue"].isString();
   const std::string queue_path = named ? document["queue"].asString() : "";
   if (FakeCallFails("MonitorQueue::Upsert", CallArguments(queue_path, application, type))) return false;

@@ -17,8 +17,9 @@ class __attribute__((visibility("default"))) MonitorQueue {
   const Json::Value& Document() const { return document_; }
 
   /// Registers a queue for `application`, in place of an earlier registration of the same queue, application and type.
-  /// Atomic and durable; blocks while another process changes the registry. False, with the failure recorded (see
-  /// kova/error.h) and the registry as it was, when the document is not of the form above or cannot be kept.
+  /// Atomic and durable; a folder whose path ends in "/" is left out, and logged; blocks while another process changes
+  /// the registry. False, with the failure recorded (see kova/error.h) and the registry as it was, when the document is
+  /// not of the form above or cannot be kept.
   static bool Upsert(const MonitorQueue& queue, const std::string& application, int type);
   /// Removes a registration; true also when there is none. Atomic and durable likewise.
   static bool Delete(const std::string& queue_path, const std::string& application, int type);
