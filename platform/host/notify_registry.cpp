@@ -1,10 +1,12 @@
 #include "platform/host/notify_registry.h"
 
+#include <sys/stat.h>
 #include <syslog.h>
 #include <unistd.h>
 
 #include <algorithm>
 #include <cerrno>
+#include <cstdio>
 #include <cstring>
 #include <filesystem>
 
@@ -66,7 +68,7 @@ std::string ReadFile(const std::string& path, Json::Value& object) {
   }
   if (problem.empty()) return {};
   return "the registration " + path + " cannot be used (" + problem +
-         "); move it away, then set the share's folders again, which registers them anew";
+         "); who registers it again replaces it, which the index daemon does for the shares within 30 s";
 }
 
 Registration FromJson(const Json::Value& object) {
@@ -97,19 +99,27 @@ std::string KeyProblem(const Key& key) {
   return {};
 }
 
-/// Changes the file of one registration while nobody else does. `change` is not called when the file that is there
-/// cannot be used: nobody's watches are dropped unseen.
+/// Where a damaged file is kept, one for each registration; its name is none of a registration.
+std::string KeptAt(const std::string& path) { return path + ".damaged"; }
+
+/// Changes the file of one registration while nobody else does. One whose content cannot be used is set aside: by its
+/// name it is this very registration, so nobody else's watches are dropped. One that cannot be read stays as it is.
 template <typename Change>
 bool ChangeFile(const Key& key, Change change) {
   const std::string path = key.File();
   const ExclusiveLock lock(RegistryFolder() + ".lock");
-  if (lock.Problem() != 0) {
-    errno = lock.Problem();
-    return Refuse(SystemFailureCode(), lock.ProblemText());
-  }
+  if (lock.Problem() != 0) return RefuseBySystem("cannot lock " + RegistryFolder() + ".lock", lock.Problem());
   Json::Value present;
   const std::string problem = ReadFile(path, present);
-  if (!problem.empty()) return Refuse(KOVA_ERR_BAD_CONFIGURATION, problem);
+  std::string text;
+  if (!problem.empty() && !ReadTextFile(path, text).empty()) return Refuse(KOVA_ERR_BAD_CONFIGURATION, problem);
+  if (!problem.empty()) {
+    present = Json::Value();
+    LogLine(LOG_WARNING, problem + "; it is set aside as " + KeptAt(path));
+    if (chmod(path.c_str(), 0600) != 0 || rename(path.c_str(), KeptAt(path).c_str()) != 0) {
+      return RefuseBySystem("cannot set the registration " + path + " aside", errno);
+    }
+  }
   return change(path, !present.isNull()) || RefuseBySystem("cannot change the registration " + path, errno);
 }
 
@@ -172,7 +182,10 @@ bool MonitorQueue::Upsert(const MonitorQueue& queue, const std::string& applicat
 bool MonitorQueue::Delete(const std::string& queue_path, const std::string& application, int type) {
   const Key key = {queue_path, application, type};
   if (!KeyProblem(key).empty()) return true;  // nobody can have registered it
-  return ChangeFile(key, [](const std::string& path, bool is_there) { return !is_there || RemoveFile(path); });
+  return ChangeFile(key, [](const std::string& path, bool is_there) {
+    (void)unlink(KeptAt(path).c_str());
+    return !is_there || RemoveFile(path);
+  });
 }
 
 }  // namespace KOVA::KOVANOTIFYD
