@@ -95,8 +95,6 @@ DaemonState StateFrom(const Daemon& daemon, RequestResult result, const std::str
   if (result == RequestResult::kNotRunning) return {};
   if (result == RequestResult::kNoAnswer) return {Json::Value(), kNoAnswer};
   return {Answer(daemon, result, reply), ""};
-} catch (const NotPermitted&) {
-  throw;
 } catch (const Failure& failure) {
   return {Json::Value(), failure.what()};
 }

@@ -35,10 +35,11 @@ class Refusal : public Failure {
   std::string reason_;
 };
 
-/// The calling user may not do it; the sentence says what, and what to do: exit code 5.
-class NotPermitted : public Failure {
+/// The calling user may not do it; the sentence says what, and what to do: exit code 5. No Failure: who goes on after
+/// one does not go on after this.
+class NotPermitted : public std::runtime_error {
  public:
-  using Failure::Failure;
+  using std::runtime_error::runtime_error;
 };
 
 /// What a command needs of the instance; each also what stands before it, but for the table of shares.

@@ -151,8 +151,6 @@ void MakeFresh(const Arguments& arguments, Scope& scope) {
 bool IsFresh(const Arguments& arguments, Scope& scope) try {
   MakeFresh(arguments, scope);
   return true;
-} catch (const NotPermitted&) {
-  throw;
 } catch (const Failure& failure) {
   const bool goes_on = arguments.Has("--partial");
   (void)fprintf(stderr, "fileindexctl: %s\n%s\n", EscapeForTerminal(failure.what()).c_str(),
