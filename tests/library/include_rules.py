@@ -14,7 +14,8 @@ HEADER_LEVELS = {"optree": 0, "util": 0, "queue_mgr": 1, "status_mgr": 1, "elast
                  "index_mgr": 4}
 # Two sources reach right: a custom event needs the queue and, when it cannot be written, the share's status; a queue
 # that is being read keeps the folders' configuration alive. The index daemon watches the host's own table of shares, the
-# notification daemon reads the host's registry and settings, and the supervisor looks after its services.
+# notification daemon reads the host's registry and settings, and the supervisor looks after its services. Frames are
+# every implementation's, and who may have to give up a request needs the connection beneath.
 EXCEPTIONS = {("fileindex/custom_event.cpp", "fileindex/queue_mgr.h"),
               ("fileindex/custom_event.cpp", "fileindex/status_mgr.h"),
               ("fileindex/queue_mgr.cpp", "fileindex/folder_mgr.h"),
@@ -22,6 +23,9 @@ EXCEPTIONS = {("fileindex/custom_event.cpp", "fileindex/queue_mgr.h"),
               ("services/kovanotifyd/main.cpp", "platform/host/configuration.h"),
               ("services/kovanotifyd/main.cpp", "platform/host/notify_registry.h"),
               ("services/fileindexd/main.cpp", "platform/host/mounts.h"),
+              ("services/fileindexd/interruption.h", "platform/base/frames.h"),
+              ("services/support/local_request.cpp", "platform/base/frames.h"),
+              ("services/supervisor/main.cpp", "platform/host/service_log.h"),
               ("services/supervisor/main.cpp", "platform/host/child_service.h")}
 # The tool keeps the table of shares, tells what is wrong in it or why a service did not start, and knows mount points.
 TOOL_MAY = {f"platform/host/{name}.h" for name in ("share_table", "share_rules", "mounts", "child_service")}
