@@ -1,7 +1,9 @@
 #pragma once
 
+#include <set>
 #include <string>
 
+#include "common/file_util.h"
 #include "fileindex/path_table.h"
 
 namespace ferrox::indexd {
@@ -10,13 +12,23 @@ namespace ferrox::indexd {
 class PathsUnderWay {
  public:
   /// Whether something at, above or below the path is worked on.
-  bool Touch(const std::string& path) const { return paths_.HasBelow(path) || paths_.HasAtOrAbove(path); }
-  void Add(const std::string& path) { paths_.Insert(path, true); }
-  void Clear() { paths_ = {}; }
+  bool Touch(const std::string& path) const {
+    const auto next = ordered_.lower_bound(path + "/");
+    return (next != ordered_.end() && StringStartWith(*next, path + "/")) || paths_.HasAtOrAbove(path);
+  }
+  void Add(const std::string& path) {
+    paths_.Insert(path, true);
+    ordered_.insert(path);
+  }
+  void Clear() {
+    paths_ = {};
+    ordered_.clear();
+  }
   size_t Count() const { return paths_.Size(); }
 
  private:
   fileindex::PathTable<bool> paths_;
+  std::set<std::string> ordered_;
 };
 
 }  // namespace ferrox::indexd
