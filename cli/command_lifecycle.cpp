@@ -11,6 +11,8 @@
 #include "cli/folder_path.h"
 #include "cli/own_share.h"
 #include "cli/share_remains.h"
+#include "common/error.h"
+#include "fileindex/elastic/elastic_control.h"
 #include "fileindex/folder_mgr.h"
 #include "fileindex/index_mgr.h"
 #include "sdk/share.h"
@@ -83,7 +85,17 @@ int RunShareResume(const Arguments& arguments) {
   const std::string name = sdk::SDKShare(arguments.words[0]).GetName();
   RequireIndexed(name, FolderMgr());
   RequireDaemons();
-  return ChangeAndReport([&] { fileindex::ShareResume(name); }, "share " + name + " was not paused");
+  const auto resume = [&] {
+    try {
+      fileindex::ShareResume(name);
+    } catch (const Error& error) {
+      // The engine has lost its list of indices: it finds the index in its folder, or makes an empty one.
+      if (error.Code() != Error::kEngineNoSuchIndex) throw;
+      fileindex::elastic::ShareIndexCreate(name);
+      fileindex::ShareResume(name);
+    }
+  };
+  return ChangeAndReport(resume, "share " + name + " was not paused");
 }
 
 int RunShareForget(const Arguments& arguments) {

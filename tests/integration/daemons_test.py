@@ -113,10 +113,12 @@ class DaemonsTest(InstanceTestCase):
         expect_healed()
         indices = f"{self.instance.root}/var/lib/kova/kovaelasticd/indices.json"
         for damaged in ([indices], [indices, indices + ".copy"]):
+            self.ctl("share", "pause", "docs")
             self.ctl("down")
             for path in damaged:
                 os.truncate(path, 20)
             self.ctl("up")
+            self.ctl("share", "resume", "docs")
             expect_healed()
             self.assertEqual(0, self.instance.status()["index_daemon"]["read"])
 
