@@ -108,9 +108,13 @@ int RunShareForget(const Arguments& arguments) {
   const std::string path =
       arguments.words.size() > 1 ? AbsolutePath(arguments.words[1]) : sdk::SDKShare(name).GetPath();
   RequireEngine();
+  const std::string queue = QueueOf(path);
+  const bool has_remains =
+      FolderMgr().IsShareIndexed(name) || HasIndex(name) || Exists(queue) || Exists(queue + ".tmp");
+  if (!known && !has_remains) throw Failure("nothing is left of a share " + name + " at " + path + "; check both");
   const int code =
       ChangeAndReport([&] { fileindex::ShareClearPaused(name, path); }, "share " + name + " had no indexed folder");
-  RemoveQueue(QueueOf(path));
+  RemoveQueue(queue);
   return code;
 }
 

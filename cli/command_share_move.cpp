@@ -45,14 +45,6 @@ struct Move {
   std::string new_path;
 };
 
-bool HasIndex(const std::string& share) {
-  const std::string id = fileindex::elastic::GetFileIndexID(share);
-  for (const Json::Value& index : AskEngine("index_list", Json::Value(Json::objectValue))) {
-    if (index["id"].asString() == id) return true;
-  }
-  return false;
-}
-
 void RefuseSharesBelow(const ShareEntry& entry) {
   for (const ShareEntry& other : kova::host::ListShares()) {
     if (other.name != entry.name && StringStartWith(other.path, entry.path + "/")) {

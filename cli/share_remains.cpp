@@ -18,6 +18,14 @@ std::string QueueOf(const std::string& share_path) {
   return path;
 }
 
+bool HasIndex(const std::string& share) {
+  const std::string id = fileindex::elastic::GetFileIndexID(share);
+  for (const Json::Value& index : AskEngine("index_list", Json::Value(Json::objectValue))) {
+    if (index["id"].asString() == id) return true;
+  }
+  return false;
+}
+
 void RemoveQueue(const std::string& queue_path) {
   for (const char* suffix : {"", ".tmp", ".folders"}) (void)Unlink(queue_path + suffix);
 }

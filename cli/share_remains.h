@@ -7,6 +7,9 @@ namespace ferrox::cli {
 /// The queue of the share whose absolute folder is, or was, `share_path`. @throws Error kInternal.
 std::string QueueOf(const std::string& share_path);
 
+/// Whether the engine has an index of that share. @throws Failure as AskEngine.
+bool HasIndex(const std::string& share);
+
 /// Removes the queue of a share that is no longer there, with what the index daemon keeps beside it: it would be taken
 /// for that of a later share of the same folder. Missing files and failures do not matter.
 void RemoveQueue(const std::string& queue_path);

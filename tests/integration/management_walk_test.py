@@ -220,6 +220,7 @@ class ManagementWalkTest(InstanceTestCase):
             (None, "already", ["share", "migrate", "photo", photo]),
             (None, "", ["share", "migrate", "photo", f"{self.vol}/nowhere"]),
             (800, "homes", ["user", "rename", "a", "b"]),
+            (None, "nothing is left", ["share", "forget", "nonexistent", "/nowhere"]),
             (None, "no indexed folder", ["folder", "reindex", "/photo/other"]),
             (None, "no folder of share", ["share", "check-recycle", "photos"]),
             *((None, f"{self.vol} is no mount point; it lies on the volume /", ["volume", verb, self.vol])
