@@ -108,7 +108,10 @@ template <typename Change>
 bool ChangeFile(const Key& key, Change change) {
   const std::string path = key.File();
   const ExclusiveLock lock(RegistryFolder() + ".lock");
-  if (lock.Problem() != 0) return RefuseBySystem("cannot lock " + RegistryFolder() + ".lock", lock.Problem());
+  if (lock.Problem() != 0) {
+    errno = lock.Problem();
+    return Refuse(SystemFailureCode(), lock.ProblemText());
+  }
   Json::Value present;
   const std::string problem = ReadFile(path, present);
   std::string text;

@@ -188,7 +188,9 @@ void Notifier::ContinueSync() {
   if (!syncs_.Outstanding().empty()) return;
   const std::string held = router_.FlushAll(SteadyClock::now());
   if (!held.empty()) sync_problems_.push_back(held);
-  for (const std::string& problem : watches_.Problems()) sync_problems_.push_back(problem);
+  for (const auto& problems : {registry_.problems, watches_.Problems()}) {
+    sync_problems_.insert(sync_problems_.end(), problems.begin(), problems.end());
+  }
   syncs_.End(sync_problems_);
 }
 

@@ -200,7 +200,7 @@ TEST_F(NotifierTest, AWorkingRegistrationDoesNotSufferFromABadOneOrAMissingFolde
   registry_.list.push_back({"test", dir_ / "queue2", {{dir_ / "nowhere", kAll}}});
   Start();
   const std::string missing = "changes of " + dir_ / "nowhere" + " are not noticed: it is missing";
-  EXPECT_EQ(notifier_->Sync(seconds(60)), std::vector<std::string>{missing});
+  EXPECT_EQ(notifier_->Sync(seconds(60)), (std::vector<std::string>{registry_.problems[0], missing}));
   EXPECT_EQ(Lines(), "10000 /folder ");
   (void)notifier_->Sync(seconds(60));
   EXPECT_EQ(notifier_->Status().problems, (std::vector<std::string>{registry_.problems[0], missing}));
