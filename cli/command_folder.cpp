@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <cstdio>
+#include <memory>
 #include <optional>
 
 #include <json/value.h>
@@ -10,10 +11,13 @@
 #include "cli/command_table.h"
 #include "cli/configuration_change.h"
 #include "cli/escape.h"
+#include "cli/explain.h"
 #include "cli/folder_path.h"
 #include "cli/format.h"
 #include "cli/kinds.h"
+#include "cli/rights.h"
 #include "common/file_util.h"
+#include "common/paths.h"
 #include "fileindex/folder_mgr.h"
 #include "fileindex/index_mgr.h"
 #include "fileindex/util.h"
@@ -23,6 +27,8 @@ namespace ferrox::cli {
 namespace {
 
 using fileindex::FolderMgr;
+
+constexpr char kQueueFolder[] = "/var/lib/kova/fileindex/queue";
 
 std::vector<std::string> SharePaths(const Arguments& arguments, const FolderMgr& configured) {
   std::vector<std::string> paths;
@@ -92,6 +98,32 @@ std::string FolderText(const Json::Value& folder) {
   return text + (TextOf(status, "desc").empty() ? "" : " (" + TextOf(status, "desc") + ")") + "\n";
 }
 
+/// The library leaves folders of which the state cannot be told out of a page. Here they stay, without it, and standard
+/// error says why. True when there were none.
+bool AddStates(Json::Value& folders, const Json::Value& told) {
+  const FolderMgr configured;
+  Json::ArrayIndex next = 0;
+  for (Json::Value& folder : folders) {
+    const std::string path = TextOf(folder, "path");
+    if (next < told.size() && TextOf(told[next], "path") == path) {
+      folder = told[next++];
+      continue;
+    }
+    std::string reason = "try again";  // it could not be told a moment ago
+    try {
+      std::shared_ptr<fileindex::Folder> one;
+      configured.Get(one, path);
+      Json::Value state;
+      one->GetStatus(state);
+    } catch (const Error& error) {
+      reason = Explain(error);
+    }
+    (void)fprintf(stderr, "fileindexctl: %s: its state cannot be told: %s\n", EscapeForTerminal(path).c_str(),
+                  EscapeForTerminal(reason).c_str());
+  }
+  return next == folders.size();
+}
+
 }  // namespace
 
 int RunFolderAdd(const Arguments& arguments) {
@@ -142,15 +174,26 @@ int RunFolderList(const Arguments& arguments) {
   constexpr long long kMost = fileindex::kFileIndexFoldersMax;
   const auto offset = static_cast<unsigned>(arguments.Number("--offset", 0, 0, kMost));
   const auto limit = static_cast<unsigned>(arguments.Number("--limit", kMost, 0, kMost));
-  Json::Value additional(Json::arrayValue);
-  if (arguments.Has("--status")) additional.append("status");
+  const auto list = [&](Json::Value& page, const Json::Value& additional) {
+    fileindex::FolderList(page, offset, limit, arguments.Get("--sort"), arguments.Has("--desc") ? "desc" : "asc",
+                          additional);
+  };
   Json::Value page;
-  fileindex::FolderList(page, offset, limit, arguments.Get("--sort"), arguments.Has("--desc") ? "desc" : "asc",
-                        additional);
+  list(page, Json::Value(Json::arrayValue));
+  bool all_told = true;
+  if (arguments.Has("--status")) {
+    RequireReadable(InstancePath(kQueueFolder));
+    Json::Value told;
+    Json::Value additional(Json::arrayValue);
+    additional.append("status");
+    list(told, additional);
+    all_told = AddStates(page["folder"], told["folder"]);
+  }
   const bool none = UintOf(page, "total") == 0;
+  const int done = all_told ? kDone : kIncomplete;
   if (arguments.Has("--json")) {
     (void)printf("%s\n", ToScriptJson(page).c_str());
-    return none ? kNothingFound : kDone;
+    return none ? kNothingFound : done;
   }
   for (const Json::Value& folder : page["folder"]) (void)printf("%s", FolderText(folder).c_str());
   if (none) (void)fprintf(stderr, "no folder is indexed; choose one with 'fileindexctl folder add PATH'\n");
@@ -158,7 +201,7 @@ int RunFolderList(const Arguments& arguments) {
   if (!none && shown != UintOf(page, "total")) {
     (void)printf("%s of %s shown\n", Count(shown).c_str(), Count(UintOf(page, "total")).c_str());
   }
-  return none ? kNothingFound : kDone;
+  return none ? kNothingFound : done;
 }
 
 }  // namespace ferrox::cli

@@ -85,6 +85,10 @@ void RequireRights(Needs needs) {
   }
 }
 
+void RequireReadable(const std::string& folder) {
+  if (IsDenied(folder, R_OK | X_OK)) throw MayNot("read", folder);
+}
+
 void ThrowSystemFailure(int error, const std::string& act, const std::string& path, const std::string& remedy) {
   if (IsDenial(error)) throw MayNot(act, path);
   throw Failure("cannot " + act + " " + path + ": " + strerror(error) + remedy);

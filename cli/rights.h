@@ -15,6 +15,9 @@ NotPermitted MayNot(const std::string& act, const std::string& path);
 /// used.
 void RequireRights(Needs needs);
 
+/// @throws NotPermitted when the caller may not look into a folder of the instance; one that is missing will do.
+void RequireReadable(const std::string& folder);
+
 /// Where the table of shares cannot be used, a command that needs it is not begun, and the others say so on standard
 /// error. @throws Failure.
 void RequireShareTable(Needs needs);

@@ -416,6 +416,7 @@ class ToolTest(unittest.TestCase):
                         self.assertRegex(done.stderr.decode(), rf"^fileindexctl: user \w+ may not \w+ {self.root}\S*, which "
                                          rf"belongs to root; run 'sudo fileindexctl --root {self.root}' .*'--root'")
         self.assertEqual(5, run("search", "--fresh", "x").returncode)
+        self.assertEqual(5, run("folder", "list", "--status").returncode)
         self.assertEqual(before, contents())
 
     def test_completion_knows_commands_shares_folders_and_kinds(self):
