@@ -65,7 +65,10 @@ void RemoveSetAside(const std::string& path) {
 }
 
 void SetAside(const std::string& path, int64_t now) {
-  if (!IsFileExist(path)) return;
+  struct stat status = {};
+  if (lstat(path.c_str(), &status) != 0 && errno == ENOENT) return;
+  FERROX_FAIL_IF(!S_ISREG(status.st_mode), Error::kEngineStorage,
+                 path + " is not a regular file, which no engine makes; move it away");
   RemoveSetAside(path);
   const std::string kept = path + kSetAside + Day(now);
   FERROX_FAIL_IF(chmod(path.c_str(), 0600) != 0 || rename(path.c_str(), kept.c_str()) != 0, Error::kEngineStorage,

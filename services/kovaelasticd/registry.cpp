@@ -55,7 +55,8 @@ bool Registry::Read(const std::string& path, Entries& entries) {
   std::string text;
   Json::Value file;
   if (!ReadWholeFile(path, text)) {
-    FERROX_FAIL_IF(errno != ENOENT, Error::kInternal, path + " cannot be read: " + ErrnoText());
+    FERROX_FAIL_IF(errno != ENOENT, Error::kInternal,
+                   path + " cannot be read: " + ErrnoText() + "; it must be a file that the engine's user may read");
     return false;
   }
   entries.clear();

@@ -16,7 +16,8 @@ std::string Remedy(int result) {
     case SQLITE_NOTADB:
       return "the file is damaged; the index is made anew";
     case SQLITE_CANTOPEN:
-      return "it cannot be opened; check that the folder exists and belongs to the engine's user";
+      return "it cannot be opened; check that it is a file, and that its folder exists and belongs to the engine's "
+             "user";
     case SQLITE_IOERR:
       return "it cannot be read or written; when that stays so, look at the disk; the system log tells more";
     default:

@@ -128,6 +128,11 @@ TEST_F(HealingTest, WhatMayPassLeavesTheIndexAsItIs) {
   ChangePages([](std::string& page) { page.compare(0, 6, "SQLite") == 0 ? void(page[63] = 99) : void(); });
   Restart();
   EXPECT_NE(Refusal().find("format 99"), std::string::npos);
+  fs::remove(file_);
+  fs::create_directory(file_);
+  const std::string refused = Send("index_rebuild", R"({"id":"a"})")["error"]["msg"].asString();
+  EXPECT_NE(refused.find(file_ + " is not a regular file"), std::string::npos) << refused;
+  fs::remove(file_);
   test::WriteFile(file_, good);
   engine_.reset();
   const std::string noted = folder_ / "state/indices.json";
