@@ -66,7 +66,9 @@ void RemoveSetAside(const std::string& path) {
 
 void SetAside(const std::string& path, int64_t now) {
   struct stat status = {};
-  if (lstat(path.c_str(), &status) != 0 && errno == ENOENT) return;
+  const bool there = lstat(path.c_str(), &status) == 0;
+  if (!there && errno == ENOENT) return;
+  FERROX_FAIL_IF(!there, Error::kEngineStorage, "cannot set " + path + " aside: " + ErrnoText());
   FERROX_FAIL_IF(!S_ISREG(status.st_mode), Error::kEngineStorage,
                  path + " is not a regular file, which no engine makes; move it away");
   RemoveSetAside(path);
