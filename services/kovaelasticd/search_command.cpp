@@ -19,8 +19,6 @@ constexpr int64_t kLimitMax = 1000;
 /// Who wants to see more hits narrows the query.
 constexpr int64_t kLastHitMax = 100000;
 constexpr size_t kMarkMaxBytes = 64;
-/// In "left_out" alone: the index was searched, but does not hold all yet.
-constexpr int kIndexRebuilding = 1410;
 
 struct IndexHit {
   std::string index_id;
@@ -170,7 +168,7 @@ std::vector<IndexHit> SearchAll(AskedIndices& asked, const SearchRequest& reques
       for (SearchHit& hit : reply.hits) hits.push_back({open.id, std::move(hit)});
       for (std::string& word : reply.suggestions) sums.suggestions.push_back(std::move(word));
       if (open.rebuild.Since() == 0) continue;
-      AddLeftOut(asked, open.id, kIndexRebuilding, "it is being rebuilt, because " + open.rebuild.Reason(),
+      AddLeftOut(asked, open.id, Error::kEngineIndexRebuilding, "it is being rebuilt, because " + open.rebuild.Reason(),
                  true);
     } catch (const Error& error) {
       LeaveOut(asked, open.id, error);

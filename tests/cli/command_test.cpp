@@ -36,7 +36,7 @@ TEST(CommandTest, WrongUsageIsRefused) {
 TEST(ExplainTest, SentenceNamesThingRemedyAndCode) {
   EXPECT_EQ("there is no share \"x\"; 'fileindexctl share list' shows the shares (error 800)",
             Explain(Error(Error::kNoSuchShare, "x")));
-  EXPECT_EQ("that did not work (error 1410)", Explain(Error(static_cast<Error::ErrorCode>(1410))));
+  EXPECT_EQ("that did not work (error 1499)", Explain(Error(static_cast<Error::ErrorCode>(1499))));
   EXPECT_EQ("no; because (error 120)", Explain(Error(Error::kBadArgument, "no"), "because"));
 }
 

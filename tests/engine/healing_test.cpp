@@ -91,7 +91,7 @@ TEST_F(HealingTest, ADamagedOrLostIndexIsMadeAnewAndToldUntilItIsComplete) {
     EXPECT_GE(found["since"].asInt64(), clock_.Now());
     Restart();
     const Json::Value searched = Send("search", R"({"query":"lantern","id":"a"})")["data"]["left_out"][0];
-    EXPECT_EQ(searched["code"], 1410);
+    EXPECT_EQ(searched["code"], Error::kEngineIndexRebuilding);
     EXPECT_EQ(searched["searched"], true);
     const auto kept = SetAside();
     ASSERT_EQ(kept.size(), row.kept ? 1U : 0U);
