@@ -10,6 +10,8 @@
 #include <set>
 #include <sstream>
 
+#include <kova/mountinfo.h>
+
 #include "platform/host/files.h"
 
 namespace kova::host {
@@ -35,20 +37,6 @@ bool GetKey(const std::string& path, MountKey& key) {
 #endif
   key.device = std::to_string(info.stx_dev_major) + ":" + std::to_string(info.stx_dev_minor);
   return true;
-}
-
-/// Blanks, tabs, newlines and backslashes stand as "\040" and so on.
-std::string Unescape(const std::string& text) {
-  std::string plain;
-  for (size_t i = 0; i < text.size(); ++i) {
-    if (text[i] == '\\' && i + 3 < text.size()) {
-      plain += static_cast<char>((text[i + 1] - '0') * 64 + (text[i + 2] - '0') * 8 + (text[i + 3] - '0'));
-      i += 3;
-    } else {
-      plain += text[i];
-    }
-  }
-  return plain;
 }
 
 /// The type in one line: "36 35 98:0 /root /mount/point options [more]... - ext4 source options".
@@ -102,7 +90,7 @@ std::vector<std::string> MountsBelow(const std::string& folder) {
     std::istringstream fields(line);
     std::string id, parent, device, root, point;
     if (!(fields >> id >> parent >> device >> root >> point)) continue;
-    point = Unescape(point);
+    point = PlainMountField(point);
     if (point.size() > prefix.size() && point.compare(0, prefix.size(), prefix) == 0) points.insert(point);
   }
   return {points.begin(), points.end()};

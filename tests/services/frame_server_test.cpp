@@ -134,6 +134,7 @@ TEST_F(FrameServerTest, UnansweredBytesAreBoundedAndGivenBack) {
 
 TEST_F(FrameServerTest, NewcomerTakesThePlaceOfTheLongestSilent) {
   options_.connections_max = 2;
+  options_.workers = 1;  // so that the first is idle again when the second is answered
   Start();
   Client oldest(path_);
   EXPECT_EQ(oldest.Ask("1"), "1");

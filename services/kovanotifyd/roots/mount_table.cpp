@@ -7,6 +7,8 @@
 #include <iterator>
 #include <sstream>
 
+#include <kova/mountinfo.h>
+
 #include "services/kovanotifyd/roots/watch_roots.h"
 
 namespace ferrox::notifyd {
@@ -16,20 +18,6 @@ namespace {
 /// File systems that ask another machine for everything.
 constexpr const char* kNetworkTypes[] = {"nfs",  "nfs4", "cifs",   "smb3",       "ceph",          "afs",
                                          "coda", "9p",   "lustre", "fuse.sshfs", "fuse.glusterfs"};
-
-/// Blanks, tabs, newlines and backslashes stand as "\040" and so on.
-std::string Unescape(const std::string& text) {
-  std::string plain;
-  for (size_t i = 0; i < text.size(); ++i) {
-    if (text[i] == '\\' && i + 3 < text.size()) {
-      plain += static_cast<char>((text[i + 1] - '0') * 64 + (text[i + 2] - '0') * 8 + (text[i + 3] - '0'));
-      i += 3;
-    } else {
-      plain += text[i];
-    }
-  }
-  return plain;
-}
 
 }  // namespace
 
@@ -49,7 +37,7 @@ void MountTable::Read() {
     std::string device, root, point;
     if (!(fields >> id >> line.parent >> device >> root >> point)) continue;
     line.entry = device + " " + root + " " + point;
-    line.point = Unescape(point);
+    line.point = kova::PlainMountField(point);
     std::string type;
     const size_t separator = text.find(" - ");
     if (separator != std::string::npos)
