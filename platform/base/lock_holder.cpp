@@ -98,18 +98,70 @@ bool IsHeldByOthers(const std::string& path, const struct stat& folder) {
                      [&](const LockHolder& holder) { return !holder.command.empty() && !IsOurs(holder.user, folder); });
 }
 
+class Descriptor {
+ public:
+  explicit Descriptor(int fd) : fd_(fd) {}
+  Descriptor(const Descriptor&) = delete;
+  Descriptor& operator=(const Descriptor&) = delete;
+  ~Descriptor() {
+    const int saved_errno = errno;
+    if (fd_ >= 0) (void)close(fd_);
+    errno = saved_errno;
+  }
+  int Get() const { return fd_; }
+
+ private:
+  int fd_;
+};
+
+bool IsAt(const std::string& path, const struct stat& file) {
+  struct stat named = {};
+  return lstat(path.c_str(), &named) == 0 && named.st_dev == file.st_dev && named.st_ino == file.st_ino;
+}
+
+/// What a look at a lock file came to. kAgain: another process changed what is at the path meanwhile.
+enum class Outcome { kPrivate, kFailed, kAgain };
+
+bool GiveToOwnerOf(const struct stat& folder, int fd) {
+  return geteuid() != 0 || folder.st_uid == 0 || fchown(fd, folder.st_uid, folder.st_gid) == 0;
+}
+
 /// For the folder's owner, whoever makes it.
-bool PutNewFile(const std::string& path, const struct stat& folder) {
+Outcome MakeNew(const std::string& path, const struct stat& folder) {
+  const Descriptor file(open(path.c_str(), O_RDWR | O_CREAT | O_EXCL | O_CLOEXEC, 0600));
+  if (file.Get() < 0) return errno == EEXIST ? Outcome::kAgain : Outcome::kFailed;
+  return GiveToOwnerOf(folder, file.Get()) ? Outcome::kPrivate : Outcome::kFailed;
+}
+
+/// Puts a new file in the place of `old`: whatever else is there by now, somebody may already rely on.
+Outcome Replace(const std::string& path, const struct stat& old, const struct stat& folder) {
   std::string temporary = path + ".XXXXXX";
-  const int fd = mkostemp(temporary.data(), O_CLOEXEC);
-  if (fd < 0) return false;
-  const bool owned = geteuid() != 0 || folder.st_uid == 0 || fchown(fd, folder.st_uid, folder.st_gid) == 0;
-  const bool put = owned && rename(temporary.c_str(), path.c_str()) == 0;
+  const Descriptor file(mkostemp(temporary.data(), O_CLOEXEC));
+  if (file.Get() < 0) return Outcome::kFailed;
+  const bool is_ours = GiveToOwnerOf(folder, file.Get());
+  const bool is_old = IsAt(path, old);
+  if (is_ours && is_old && rename(temporary.c_str(), path.c_str()) == 0) return Outcome::kPrivate;
   const int saved_errno = errno;
-  (void)close(fd);
-  if (!put) (void)unlink(temporary.c_str());
+  (void)unlink(temporary.c_str());
   errno = saved_errno;
-  return put;
+  return is_ours && !is_old ? Outcome::kAgain : Outcome::kFailed;
+}
+
+Outcome TryToMakePrivate(const std::string& path, const struct stat& folder) {
+  struct stat file = {};
+  if (lstat(path.c_str(), &file) != 0) return errno == ENOENT ? MakeNew(path, folder) : Outcome::kFailed;
+  // What is no file of ours but lies here by our own doing is not for us to remove: it fails when it is opened.
+  if (!S_ISREG(file.st_mode) && IsOurs(file.st_uid, folder)) return Outcome::kPrivate;
+  const Descriptor opened(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK));
+  bool is_private = false, in_use = false;
+  if (opened.Get() >= 0 && fstat(opened.Get(), &file) == 0 && S_ISREG(file.st_mode)) {
+    // While it is held here, nobody else replaces it, or takes it for the file that will be in its place.
+    in_use = flock(opened.Get(), LOCK_EX | LOCK_NB) != 0;
+    if (!IsAt(path, file)) return Outcome::kAgain;
+    is_private = IsOurs(file.st_uid, folder) && (file.st_mode & 077) == 0 && file.st_nlink == 1;
+  }
+  const bool good = in_use ? !IsHeldByOthers(path, folder) : is_private;
+  return good ? Outcome::kPrivate : Replace(path, file, folder);
 }
 
 }  // namespace
@@ -150,22 +202,13 @@ bool MakeLockFilePrivate(const std::string& path) {
   struct stat folder = {};
   if (stat(FolderOf(path).c_str(), &folder) != 0) return false;
   if (geteuid() != 0 && geteuid() != folder.st_uid) return true;
-  struct stat file = {};
-  // What is no file of ours but lies here by our own doing is not for us to remove: it fails when it is opened.
-  if (lstat(path.c_str(), &file) == 0 && !S_ISREG(file.st_mode) && IsOurs(file.st_uid, folder)) return true;
-  const int fd = open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK);
-  bool is_private = false, in_use = false;
-  if (fd >= 0 && fstat(fd, &file) == 0 && S_ISREG(file.st_mode)) {
-    is_private = IsOurs(file.st_uid, folder) && (file.st_mode & 077) == 0 && file.st_nlink == 1;
-    // While it is held here, nobody else takes it for the file that will be in its place.
-    in_use = flock(fd, LOCK_EX | LOCK_NB) != 0;
+  constexpr int kAttempts = 100;
+  Outcome outcome = Outcome::kAgain;
+  for (int attempt = 0; attempt < kAttempts && outcome == Outcome::kAgain; ++attempt) {
+    outcome = TryToMakePrivate(path, folder);
   }
-  const bool good = in_use ? !IsHeldByOthers(path, folder) : is_private;
-  const bool done = good || PutNewFile(path, folder);
-  const int saved_errno = errno;
-  if (fd >= 0) (void)close(fd);
-  errno = saved_errno;
-  return done;
+  if (outcome == Outcome::kAgain) errno = EBUSY;
+  return outcome == Outcome::kPrivate;
 }
 
 }  // namespace kova

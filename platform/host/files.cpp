@@ -76,6 +76,24 @@ bool Dress(int fd, const struct stat& like) {
   return (owned || fchown(fd, like.st_uid, like.st_gid) == 0) && fchmod(fd, like.st_mode & 07777) == 0;
 }
 
+/// 0, or why the lock cannot be had: an error number.
+int LockUntil(int fd, std::chrono::steady_clock::time_point deadline) {
+  constexpr int kPollMs = 20;
+  while (flock(fd, LOCK_EX | LOCK_NB) != 0) {
+    const int problem = errno;
+    const bool is_held = problem == EINTR || problem == EWOULDBLOCK;
+    if (!is_held || std::chrono::steady_clock::now() > deadline) return problem;
+    (void)poll(nullptr, 0, kPollMs);
+  }
+  return 0;
+}
+
+bool IsStillAt(int fd, const std::string& path) {
+  struct stat opened = {}, named = {};
+  return fstat(fd, &opened) == 0 && lstat(path.c_str(), &named) == 0 && opened.st_dev == named.st_dev &&
+         opened.st_ino == named.st_ino;
+}
+
 bool SyncFolder(const std::string& path) {
   const Fd folder(open(path.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
   return folder.Valid() && fsync(folder.Get()) == 0;
@@ -91,16 +109,12 @@ bool Fd::Close() { return close(std::exchange(fd_, -1)) == 0; }
 
 int Fd::Release() { return std::exchange(fd_, -1); }
 
-ExclusiveLock::ExclusiveLock(const std::string& path) : path_(path), file_(OpenLockFile(path)) {
-  constexpr int kPollMs = 20;
+ExclusiveLock::ExclusiveLock(const std::string& path) : path_(path) {
   const auto deadline = std::chrono::steady_clock::now() + kLockMax;
-  while (!file_.Valid() || flock(file_.Get(), LOCK_EX | LOCK_NB) != 0) {
-    const bool is_held = file_.Valid() && (errno == EINTR || errno == EWOULDBLOCK);
-    problem_ = errno;
-    if (!is_held || std::chrono::steady_clock::now() > deadline) return;
-    (void)poll(nullptr, 0, kPollMs);
-  }
-  problem_ = 0;
+  do {  // it may just have been replaced
+    file_ = std::make_unique<Fd>(OpenLockFile(path));
+    problem_ = file_->Valid() ? LockUntil(file_->Get(), deadline) : errno;
+  } while (problem_ == 0 && !IsStillAt(file_->Get(), path));
 }
 
 std::string ExclusiveLock::ProblemText() const {

@@ -3,6 +3,7 @@
 #include <sys/stat.h>
 #include <sys/types.h>
 
+#include <memory>
 #include <string>
 
 #include <json/value.h>
@@ -40,7 +41,7 @@ class ExclusiveLock {
 
  private:
   std::string path_;
-  Fd file_;
+  std::unique_ptr<Fd> file_;
   int problem_ = 0;
 };
 

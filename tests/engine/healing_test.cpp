@@ -5,6 +5,7 @@
 #include <functional>
 #include <vector>
 
+#include "common/error.h"
 #include "tests/engine/engine_fixture.h"
 #include "tests/support/fake_clock.h"
 
