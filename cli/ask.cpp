@@ -165,9 +165,12 @@ InstanceState AskAll() {
 }
 
 std::string NotNoticed() {
-  if (services::IsServed(InstancePath(kNotifydSocket))) return {};
-  return "the notification daemon does not run, so that what has changed since may be missing; start it with "
-         "'fileindexctl up'";
+  for (const Daemon& daemon : {kNotificationDaemon, kIndexDaemon}) {
+    if (services::IsServed(InstancePath(daemon.socket))) continue;
+    return std::string(daemon.name) + " does not run, so that what has changed since may be missing; start it with " +
+           "'fileindexctl up'";
+  }
+  return {};
 }
 
 /// First what the file systems have reported is in the queues, then what is in the queues is in the index. Only where

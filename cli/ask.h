@@ -33,7 +33,7 @@ struct InstanceState {
 /// @throws NotPermitted.
 InstanceState AskAll();
 
-/// Why changes are not noticed now, so that the index may be behind; empty when the notification daemon runs.
+/// Why changes are not noticed or not indexed now, so that the index may be behind; empty when both daemons run.
 std::string NotNoticed();
 
 /// Waits until what was changed before in the shares (none named: in all that are worked on) is in the index. @return

@@ -201,11 +201,12 @@ class DaemonsTest(InstanceTestCase):
             self.assertNotEqual(pid, self.instance.pid(program))
         self.assertIsNone(self.instance.status()["supervisor"])
         pid = self.instance.pid("kovanotifyd")
-        self.instance.kill("kovanotifyd")
-        done = self.instance.run("search", "--json", "nothing")
-        self.assertIn(b"notification daemon does not run", done.stderr)
-        self.assertIn("does not run", json.loads(done.stdout)["not_noticed"])
-        self.ctl("up", "--no-supervisor")
+        for program, name in (("kovanotifyd", b"notification"), ("fileindexd", b"index")):
+            self.instance.kill(program)
+            done = self.instance.run("search", "--json", "nothing")
+            self.assertIn(name + b" daemon does not run", done.stderr)
+            self.assertIn("does not run", json.loads(done.stdout)["not_noticed"])
+            self.ctl("up", "--no-supervisor")
         for supervisor in (None, "fileindex-supervisor"):  # killed itself, it is missed, and is started by the next "up"
             if supervisor is not None:
                 self.instance.kill(supervisor)
