@@ -68,7 +68,8 @@ class ExtractionTest(InstanceTestCase):
         socket = f"{self.instance.root}/var/run/{DAEMON}.sock"
         os.remove(socket)
         os.makedirs(f"{socket}/occupied")  # nothing can be served there
-        write(f"{folder}/b.txt", "balloon")
+        write(f"{folder}.b", "balloon")
+        os.rename(f"{folder}.b", f"{folder}/b.txt")  # never empty there: no content has to be read for that
         self.ctl("index", "docs")
         wait_for(lambda: self.docs()["state"] == "waiting for content extraction", "the daemon to notice")
         state = self.docs()
