@@ -27,9 +27,13 @@ bool IsDenied(const std::string& path, int mode) {
   return faccessat(AT_FDCWD, path.c_str(), mode, AT_EACCESS) != 0 && IsDenial(errno);
 }
 
+/// For several threads: 'status' asks the daemons at once, and each may refuse.
 std::string UserName(uid_t uid) {
-  const passwd* user = getpwuid(uid);
-  return user != nullptr ? user->pw_name : std::to_string(uid);
+  passwd entry = {};
+  passwd* user = nullptr;
+  char names[16384];
+  const int problem = getpwuid_r(uid, &entry, names, sizeof(names), &user);
+  return problem == 0 && user != nullptr ? user->pw_name : std::to_string(uid);
 }
 
 /// Of the path, or of the deepest folder above it that can be told.
