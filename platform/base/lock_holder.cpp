@@ -12,7 +12,7 @@
 #include <cstdlib>
 #include <filesystem>
 #include <fstream>
-#include <iterator>
+#include <sstream>
 
 #include <kova/lock_holder.h>
 
@@ -20,9 +20,12 @@ namespace kova {
 
 namespace {
 
+/// As far as it can be read: a process may end meanwhile, and reading its files fails then.
 std::string ReadWhole(const std::string& path) {
   std::ifstream file(path);
-  return {std::istreambuf_iterator<char>(file), std::istreambuf_iterator<char>()};
+  std::ostringstream text;
+  if (file) text << file.rdbuf();
+  return text.str();
 }
 
 std::string ProcessFolder(pid_t pid) { return "/proc/" + std::to_string(pid); }
