@@ -35,14 +35,6 @@ bool IsRegular(int fd) {
   return fstat(fd, &opened) == 0 && S_ISREG(opened.st_mode);
 }
 
-/// Whether `path` still names the open file: a queue's file may be renamed away before its lock is had.
-bool IsStillAt(int fd, const std::string& path) {
-  struct stat opened = {};
-  struct stat named = {};
-  return fstat(fd, &opened) == 0 && lstat(path.c_str(), &named) == 0 && opened.st_dev == named.st_dev &&
-         opened.st_ino == named.st_ino;
-}
-
 void WaitForNextAttempt() { Clock::Get().SleepFor(std::chrono::milliseconds(100 * (rand() % 10))); }
 
 /// Who keeps a lock for longer than anybody waits is worth knowing.
@@ -67,7 +59,7 @@ LockFile::LockFile(const std::string& path, bool exclusive) : path_(path) {
                         "open failed, path=" + path_ + ", reason=not a regular file");
     }
     const bool locked = flock(fd_, (exclusive ? LOCK_EX : LOCK_SH) | LOCK_NB) == 0;
-    if (locked && IsStillAt(fd_, path_)) return;
+    if (locked && kova::IsStillAt(fd_, path_)) return;
     const int lock_errno = errno;
     (void)close(fd_);
     fd_ = -1;
@@ -92,7 +84,7 @@ std::unique_ptr<LockFile> LockFile::Try(const std::string& path, bool exclusive)
       return nullptr;
     }
     if (flock(file.Get(), (exclusive ? LOCK_EX : LOCK_SH) | LOCK_NB) != 0) return nullptr;
-    if (!IsStillAt(file.Get(), path)) continue;  // a renamed file frees its path at once
+    if (!kova::IsStillAt(file.Get(), path)) continue;  // a renamed file frees its path at once
     lock->fd_ = file.Release();
     lock->path_ = path;
     return lock;

@@ -189,6 +189,11 @@ std::string LockHolderText(const std::string& path) {
          std::to_string(first.user) + " holds the lock";
 }
 
+bool IsStillAt(int fd, const std::string& path) {
+  struct stat opened = {};
+  return fstat(fd, &opened) == 0 && IsAt(path, opened);
+}
+
 bool IsEnding(pid_t pid) {
   const std::string status = "\n" + ReadWhole(ProcessFolder(pid) + "/status");
   const std::string state = StatusField(status, "State");

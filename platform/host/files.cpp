@@ -88,12 +88,6 @@ int LockUntil(int fd, std::chrono::steady_clock::time_point deadline) {
   return 0;
 }
 
-bool IsStillAt(int fd, const std::string& path) {
-  struct stat opened = {}, named = {};
-  return fstat(fd, &opened) == 0 && lstat(path.c_str(), &named) == 0 && opened.st_dev == named.st_dev &&
-         opened.st_ino == named.st_ino;
-}
-
 bool SyncFolder(const std::string& path) {
   const Fd folder(open(path.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
   return folder.Valid() && fsync(folder.Get()) == 0;

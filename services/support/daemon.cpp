@@ -65,12 +65,6 @@ bool LockWithPatience(int fd, const std::string& path) {
   return true;
 }
 
-bool IsStillAt(int fd, const std::string& path) {
-  struct stat opened = {}, named = {};
-  return fstat(fd, &opened) == 0 && lstat(path.c_str(), &named) == 0 && opened.st_dev == named.st_dev &&
-         opened.st_ino == named.st_ino;
-}
-
 std::string PidPath(const std::string& name) { return InstancePath(("/var/run/" + name + ".pid").c_str()); }
 
 /// The pid file of a running process is locked by it; what is written in it is only for people.
@@ -85,7 +79,7 @@ UniqueFd TakePidFile(const std::string& path, const std::string& name) {
     FERROX_FAIL_IF(!locked, Error::kInternal,
                    name + " runs already in this instance (" + path + " is locked" +
                        (holder.empty() ? "" : ": " + holder) + "); stop it first");
-  } while (!IsStillAt(file.Get(), path));
+  } while (!kova::IsStillAt(file.Get(), path));
   const std::string text = std::to_string(getpid()) + "\n";
   const bool written =
       ftruncate(file.Get(), 0) == 0 && write(file.Get(), text.data(), text.size()) == static_cast<ssize_t>(text.size());
@@ -128,7 +122,7 @@ Daemon::~Daemon() {
   if (std::uncaught_exceptions() == 0) (void)!ftruncate(pid_file_.Get(), 0);
 }
 
-bool Daemon::HasPidFile() const { return IsStillAt(pid_file_.Get(), PidPath(name_)); }
+bool Daemon::HasPidFile() const { return kova::IsStillAt(pid_file_.Get(), PidPath(name_)); }
 
 void Daemon::NotifyReady() {
   const char* address = getenv("NOTIFY_SOCKET");
