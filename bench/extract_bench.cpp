@@ -28,8 +28,8 @@
 #include <kova/content_type.h>
 #include <kova/service.h>
 
+#include "base/unique_fd.h"
 #include "common/file_util.h"
-#include "common/unique_fd.h"
 #include "services/kovacontentextractd/readers/archive.h"
 #include "services/kovacontentextractd/readers/audio.h"
 #include "services/kovacontentextractd/readers/electronic_book.h"
@@ -103,7 +103,7 @@ Json::Value Parse(const std::string& path, bool need_meta) {
 /// What ParseFile would do if it read the file itself.
 Json::Value ReadHere(const std::string& path) {
   Json::Value document = Parse(path, false);
-  const UniqueFd file(open(path.c_str(), O_RDONLY | O_NOFOLLOW | O_CLOEXEC));
+  const base::UniqueFd file(open(path.c_str(), O_RDONLY | O_NOFOLLOW | O_CLOEXEC));
   struct stat info = {};
   std::array<char, kova::content::kHeadBytes> head;
   const ssize_t got = fstat(file.Get(), &info) == 0 ? pread(file.Get(), head.data(), head.size(), 0) : -1;

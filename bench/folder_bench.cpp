@@ -34,8 +34,8 @@
 #include "common/json_util.h"
 #include "common/new_class.h"
 #include "common/paths.h"
-#include "fileindex/folder_mgr.h"
-#include "fileindex/folder_status.h"
+#include "fileindex/folders/folder_mgr.h"
+#include "fileindex/folders/folder_status.h"
 #include "sdk/share.h"
 
 namespace {

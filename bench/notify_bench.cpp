@@ -30,7 +30,7 @@
 #include <string>
 #include <vector>
 
-#include "common/unique_fd.h"
+#include "base/unique_fd.h"
 #include "services/kovanotifyd/filesystem/filesystem_watcher.h"
 #include "services/kovanotifyd/folders/fan_inode_port.h"
 #include "services/kovanotifyd/folders/folder_watcher.h"
@@ -40,7 +40,7 @@
 
 namespace {
 
-using ferrox::UniqueFd;
+using base::UniqueFd;
 using ferrox::notifyd::Change;
 using ferrox::notifyd::QueueRouter;
 using ferrox::notifyd::Watcher;
@@ -136,7 +136,7 @@ class FanLoop : public Reader {
   }
 
  private:
-  UniqueFd fd_;
+  base::UniqueFd fd_;
   std::vector<char> buffer_;
   uint64_t records_ = 0;
 };
@@ -164,7 +164,7 @@ class InotifyLoop : public Reader {
   }
 
  private:
-  UniqueFd fd_;
+  base::UniqueFd fd_;
   std::vector<char> buffer_;
   uint64_t records_ = 0;
 };

@@ -31,7 +31,7 @@
 #include <benchmark/benchmark.h>
 #include <json/reader.h>
 
-#include "fileindex/optree.h"
+#include "fileindex/optree/optree.h"
 
 namespace {
 

@@ -28,7 +28,7 @@
 #include <kova/share.h>
 
 #include "common/log.h"
-#include "fileindex/related_services.h"
+#include "fileindex/operations/related_services.h"
 #include "platform/host/log.h"
 #include "platform/host/notify_registry.h"
 #include "platform/host/samba_shares.h"

@@ -18,8 +18,8 @@
 #include "cli/rights.h"
 #include "common/file_util.h"
 #include "common/paths.h"
-#include "fileindex/folder_mgr.h"
-#include "fileindex/index_mgr.h"
+#include "fileindex/folders/folder_mgr.h"
+#include "fileindex/operations/index_mgr.h"
 #include "fileindex/util.h"
 
 namespace ferrox::cli {

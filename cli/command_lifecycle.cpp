@@ -13,8 +13,8 @@
 #include "cli/share_remains.h"
 #include "common/error.h"
 #include "fileindex/elastic/elastic_control.h"
-#include "fileindex/folder_mgr.h"
-#include "fileindex/index_mgr.h"
+#include "fileindex/folders/folder_mgr.h"
+#include "fileindex/operations/index_mgr.h"
 #include "sdk/share.h"
 
 /// What the host's administrator, or a script, tells of shares, volumes, homes and users.

@@ -11,7 +11,7 @@
 #include "cli/escape.h"
 #include "cli/rights.h"
 #include "common/json_util.h"
-#include "fileindex/optree.h"
+#include "fileindex/optree/optree.h"
 
 namespace ferrox::cli {
 

@@ -12,7 +12,7 @@
 #include "cli/format.h"
 #include "cli/left_out.h"
 #include "fileindex/elastic/elastic_control.h"
-#include "fileindex/folder_mgr.h"
+#include "fileindex/folders/folder_mgr.h"
 #include "fileindex/util.h"
 #include "sdk/share.h"
 

@@ -14,8 +14,8 @@
 #include "cli/share_remains.h"
 #include "common/error.h"
 #include "common/file_util.h"
-#include "fileindex/folder_mgr.h"
-#include "fileindex/index_mgr.h"
+#include "fileindex/folders/folder_mgr.h"
+#include "fileindex/operations/index_mgr.h"
 #include "platform/host/share_rules.h"
 #include "sdk/share.h"
 

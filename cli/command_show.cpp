@@ -13,7 +13,7 @@
 #include "cli/left_out.h"
 #include "common/file_util.h"
 #include "fileindex/elastic/elastic_control.h"
-#include "fileindex/folder_mgr.h"
+#include "fileindex/folders/folder_mgr.h"
 #include "fileindex/util.h"
 #include "sdk/share.h"
 

@@ -10,7 +10,7 @@
 #include "cli/watching.h"
 #include "common/clock.h"
 #include "common/file_util.h"
-#include "fileindex/folder_mgr.h"
+#include "fileindex/folders/folder_mgr.h"
 #include "platform/host/child_service.h"
 #include "platform/host/share_table.h"
 

@@ -9,8 +9,8 @@
 #include "cli/share_remains.h"
 #include "common/error.h"
 #include "common/file_util.h"
-#include "fileindex/folder_mgr.h"
-#include "fileindex/index_mgr.h"
+#include "fileindex/folders/folder_mgr.h"
+#include "fileindex/operations/index_mgr.h"
 #include "platform/host/mounts.h"
 #include "sdk/share.h"
 

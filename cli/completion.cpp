@@ -11,7 +11,7 @@
 #include "cli/global_options.h"
 #include "cli/kinds.h"
 #include "common/file_util.h"
-#include "fileindex/folder_mgr.h"
+#include "fileindex/folders/folder_mgr.h"
 #include "sdk/share.h"
 
 namespace ferrox::cli {

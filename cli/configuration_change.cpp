@@ -5,14 +5,14 @@
 #include <cstring>
 #include <set>
 
+#include "base/scope_exit.h"
 #include "cli/command.h"
 #include "cli/escape.h"
 #include "cli/explain.h"
 #include "common/file_util.h"
 #include "common/log.h"
 #include "common/paths.h"
-#include "common/scope_exit.h"
-#include "fileindex/folder_mgr.h"
+#include "fileindex/folders/folder_mgr.h"
 #include "fileindex/status_mgr.h"
 #include "sdk/share.h"
 
@@ -43,7 +43,7 @@ std::string FoldersFile() {
 void ChangeConfiguration(const std::function<void()>& change) {
   const std::string before = FoldersFile();
   g_log = SetLogSink(&NoteNotDone);
-  const ScopeExit restore([] { (void)SetLogSink(g_log); });
+  const base::ScopeExit restore([] { (void)SetLogSink(g_log); });
   try {
     change();
   } catch (const Error& error) {

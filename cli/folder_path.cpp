@@ -11,7 +11,7 @@
 #include "cli/rights.h"
 #include "common/error.h"
 #include "common/file_util.h"
-#include "fileindex/folder_mgr.h"
+#include "fileindex/folders/folder_mgr.h"
 #include "fileindex/util.h"
 #include "sdk/share.h"
 

@@ -10,7 +10,7 @@
 #include "common/error.h"
 #include "common/file_util.h"
 #include "fileindex/elastic/elastic_control.h"
-#include "fileindex/folder_mgr.h"
+#include "fileindex/folders/folder_mgr.h"
 
 namespace ferrox::cli {
 

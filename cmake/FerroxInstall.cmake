@@ -10,11 +10,14 @@ install(TARGETS fileindex platform_host kova_interface EXPORT fileindexTargets
 install(EXPORT fileindexTargets NAMESPACE fileindex:: DESTINATION ${package_folder})
 
 # Of the library's own headers, those that describe what libfileindex.so shows; the others are its own business.
-install(DIRECTORY ${CMAKE_SOURCE_DIR}/common ${CMAKE_SOURCE_DIR}/sdk DESTINATION ${header_folder}
+install(DIRECTORY ${CMAKE_SOURCE_DIR}/base ${CMAKE_SOURCE_DIR}/common ${CMAKE_SOURCE_DIR}/sdk DESTINATION ${header_folder}
         FILES_MATCHING PATTERN "*.h")
-foreach(header folder folder_mgr index_mgr optree queue_mgr status_mgr util watch_list elastic/comm elastic/elastic_control elastic/fields)
-  get_filename_component(folder fileindex/${header} DIRECTORY)
-  install(FILES ${CMAKE_SOURCE_DIR}/fileindex/${header}.h DESTINATION ${header_folder}/${folder})
+foreach(header fileindex/folder fileindex/folder_mgr fileindex/index_mgr fileindex/optree fileindex/queue_mgr fileindex/status_mgr fileindex/util
+        fileindex/watch_list fileindex/folders/folder fileindex/folders/folder_mgr fileindex/operations/index_mgr
+        fileindex/operations/watch_list fileindex/optree/optree fileindex/queue/queue_mgr fileindex/elastic/comm
+        fileindex/elastic/elastic_control fileindex/elastic/fields wire/fields)
+  get_filename_component(folder ${header} DIRECTORY)
+  install(FILES ${CMAKE_SOURCE_DIR}/${header}.h DESTINATION ${header_folder}/${folder})
 endforeach()
 install(DIRECTORY ${CMAKE_SOURCE_DIR}/platform/include/kova DESTINATION ${header_folder} FILES_MATCHING PATTERN "*.h")
 

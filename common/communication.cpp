@@ -14,11 +14,11 @@
 
 #include <json/value.h>
 
+#include "base/unique_fd.h"
 #include "common/clock.h"
 #include "common/json_util.h"
 #include "common/log.h"
 #include "common/paths.h"
-#include "common/unique_fd.h"
 
 namespace ferrox {
 
@@ -59,7 +59,7 @@ void SkipReply(int fd) {
 
 void SendCommandToDaemon(const std::string& command, const Json::Value& data) {
   (void)signal(SIGPIPE, SIG_IGN);
-  const UniqueFd daemon(socket(PF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0));
+  const base::UniqueFd daemon(socket(PF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0));
   FERROX_FAIL_IF_AS(!daemon.Valid(), "0 > (fd_socket = socket(PF_UNIX, SOCK_STREAM, 0))", Error::kInternal,
                     "socket failed, reason=" + ErrnoText());
   ConnectToDaemon(daemon.Get());

@@ -13,10 +13,10 @@
 #include <kova/fs.h>
 #include <kova/user.h>
 
+#include "base/unique_fd.h"
 #include "common/log.h"
 #include "common/mutex.h"
 #include "common/sdk_mutex.h"
-#include "common/unique_fd.h"
 
 namespace ferrox {
 
@@ -43,7 +43,7 @@ bool SyncFolderOf(const std::string& path) {
 
 /// Writes `content` to the file at `path`, which is to replace `old` (null: there is none), and makes it durable.
 bool WriteNewFile(const std::string& path, std::string_view content, const struct stat* old) {
-  const UniqueFd file(open(path.c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC | O_NOFOLLOW, 0600));
+  const base::UniqueFd file(open(path.c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC | O_NOFOLLOW, 0600));
   if (!file.Valid()) return false;
   if (old != nullptr && fchown(file.Get(), old->st_uid, old->st_gid) != 0) errno = 0;  // not everybody may
   const mode_t mode = old != nullptr ? (old->st_mode & 0777) : 0644;
@@ -106,7 +106,7 @@ std::string GetFileExtension(const std::string& path, bool lower) {
 /// The kernel resolves a path at once, where realpath() asks it anew for each folder on the way.
 std::string RealPath(const std::string& path) {
   char resolved[PATH_MAX];
-  const UniqueFd opened(open(path.c_str(), O_PATH | O_CLOEXEC));
+  const base::UniqueFd opened(open(path.c_str(), O_PATH | O_CLOEXEC));
   const std::string link = "/proc/self/fd/" + std::to_string(opened.Get());
   const ssize_t size = opened.Valid() ? readlink(link.c_str(), resolved, sizeof(resolved)) : -1;
   const std::string_view found(resolved, size > 0 && size < PATH_MAX ? static_cast<size_t>(size) : 0);
@@ -163,12 +163,12 @@ bool WriteWholeFile(const std::string& path, std::string_view content) {
 }
 
 bool SyncFolder(const std::string& folder) {
-  const UniqueFd opened(open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+  const base::UniqueFd opened(open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
   return opened.Valid() && fsync(opened.Get()) == 0;
 }
 
 bool ReadWholeFile(const std::string& path, std::string& content) {
-  const UniqueFd file(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK));
+  const base::UniqueFd file(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK));
   struct stat status = {};
   if (!file.Valid() || fstat(file.Get(), &status) != 0) return false;
   if (!S_ISREG(status.st_mode)) {

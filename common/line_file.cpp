@@ -8,8 +8,8 @@
 
 #include <cerrno>
 
+#include "base/unique_fd.h"
 #include "common/log.h"
-#include "common/unique_fd.h"
 
 namespace ferrox {
 
@@ -31,7 +31,7 @@ void TakeBack(int fd, off_t size_before, ssize_t written) {
 }  // namespace
 
 bool AppendLines(const std::string& path, std::string_view lines) {
-  const UniqueFd file(open(path.c_str(), O_RDWR | O_CREAT | O_APPEND | O_CLOEXEC | O_NOFOLLOW, 0644));
+  const base::UniqueFd file(open(path.c_str(), O_RDWR | O_CREAT | O_APPEND | O_CLOEXEC | O_NOFOLLOW, 0644));
   struct stat before = {};
   if (!file.Valid() || fstat(file.Get(), &before) != 0) return false;
   char newline = '\n';

@@ -12,9 +12,9 @@
 
 #include <kova/lock_holder.h>
 
+#include "base/unique_fd.h"
 #include "common/clock.h"
 #include "common/log.h"
-#include "common/unique_fd.h"
 
 namespace ferrox {
 
@@ -77,7 +77,7 @@ LockFile::LockFile(const std::string& path, bool exclusive) : path_(path) {
 std::unique_ptr<LockFile> LockFile::Try(const std::string& path, bool exclusive) {
   std::unique_ptr<LockFile> lock(new LockFile);
   for (int attempt = 0; attempt < kAttempts; ++attempt) {
-    UniqueFd file(OpenLockFile(path));
+    base::UniqueFd file(OpenLockFile(path));
     if (!file.Valid()) return nullptr;
     if (!IsRegular(file.Get())) {
       errno = EINVAL;

@@ -1,20 +1,10 @@
 #pragma once
 
-#include <utility>
+#include "base/scope_exit.h"
 
+/// Here for programs that include this path: the class itself is base's.
 namespace ferrox {
 
-/// Calls a function when the scope ends.
-template <typename Function>
-class ScopeExit {
- public:
-  explicit ScopeExit(Function function) : function_(std::move(function)) {}
-  ScopeExit(const ScopeExit&) = delete;
-  ScopeExit& operator=(const ScopeExit&) = delete;
-  ~ScopeExit() { function_(); }
-
- private:
-  Function function_;
-};
+using base::ScopeExit;
 
 }  // namespace ferrox

@@ -4,7 +4,7 @@
 
 #include "common/error.h"
 #include "common/json_util.h"
-#include "fileindex/optree.h"
+#include "fileindex/optree/optree.h"
 
 /// Queue lines read by the JSON library alone, to hold the quick reading against.
 namespace ferrox::test {

@@ -13,7 +13,7 @@
 #include "common/file_util.h"
 #include "common/log.h"
 #include "common/paths.h"
-#include "fileindex/folder_mgr.h"
+#include "fileindex/folders/folder_mgr.h"
 #include "fuzz/memory_folder.h"
 #include "tests/support/fake_platform.h"
 

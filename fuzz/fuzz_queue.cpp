@@ -6,10 +6,10 @@
 #include <cstdlib>
 #include <iostream>
 
+#include "base/unique_fd.h"
 #include "common/error.h"
 #include "common/log.h"
 #include "common/new_class.h"
-#include "common/unique_fd.h"
 #include "fuzz/queue_model.h"
 
 using ferrox::test::ListModel;
@@ -35,7 +35,7 @@ void Feed(ListModel& model, const std::string& queue) {
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   (void)ferrox::SetLogSink([](int, const char*) {});
   if (size > kInputMaxBytes) return 0;
-  const ferrox::UniqueFd file(memfd_create("queue", MFD_CLOEXEC));
+  const base::UniqueFd file(memfd_create("queue", MFD_CLOEXEC));
   if (write(file.Get(), data, size) != static_cast<ssize_t>(size)) abort();
   ferrox::fileindex::OPTree tree("/proc/self/fd/" + std::to_string(file.Get()));
   ListModel model;

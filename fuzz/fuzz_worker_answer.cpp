@@ -11,7 +11,7 @@
 #include <string_view>
 #include <vector>
 
-#include "common/unique_fd.h"
+#include "base/unique_fd.h"
 #include "services/kovacontentextractd/answer.h"
 #include "services/kovacontentextractd/readers/reader.h"
 #include "services/kovacontentextractd/readers/utf8.h"
@@ -27,7 +27,7 @@ void Require(bool condition) {
 }
 
 void RequireTextWhole(const std::string& text) {
-  static const ferrox::UniqueFd region = MakeRegion();
+  static const base::UniqueFd region = MakeRegion();
   Require(pwrite(region.Get(), text.data(), text.size(), 0) == static_cast<ssize_t>(text.size()));
   std::string copied;
   const bool whole = CopyText(region.Get(), text.size(), [&copied](size_t offset, std::string_view piece) {

@@ -8,7 +8,7 @@
 #include <vector>
 
 #include "common/json_util.h"
-#include "fileindex/optree.h"
+#include "fileindex/optree/optree.h"
 
 namespace ferrox::test {
 

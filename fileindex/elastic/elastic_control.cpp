@@ -10,10 +10,10 @@
 #include "common/log.h"
 #include "common/new_class.h"
 #include "fileindex/elastic/comm.h"
-#include "fileindex/elastic/fields.h"
 #include "fileindex/elastic/requests.h"
 #include "fileindex/status_mgr.h"
 #include "sdk/share.h"
+#include "wire/fields.h"
 
 namespace ferrox::fileindex::elastic {
 

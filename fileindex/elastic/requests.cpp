@@ -4,7 +4,7 @@
 #include "common/file_util.h"
 #include "common/json_util.h"
 #include "fileindex/elastic/elastic_control.h"
-#include "fileindex/elastic/fields.h"
+#include "wire/fields.h"
 
 namespace ferrox::fileindex::elastic {
 

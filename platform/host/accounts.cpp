@@ -5,7 +5,7 @@
 
 #include <cerrno>
 
-#include "platform/base/failure.h"
+#include "platform/shared/failure.h"
 
 namespace kova::host {
 

@@ -19,12 +19,12 @@
 #include <kova/instance.h>
 #include <kova/lock_holder.h>
 
-#include "platform/base/failure.h"
-#include "platform/base/frames.h"
 #include "platform/host/detached_process.h"
 #include "platform/host/files.h"
 #include "platform/host/log.h"
 #include "platform/host/service_log.h"
+#include "platform/shared/failure.h"
+#include "platform/shared/frames.h"
 
 namespace kova::host {
 

@@ -6,8 +6,8 @@
 #include <kova/instance.h>
 #include <kova/user.h>
 
-#include "platform/base/failure.h"
 #include "platform/host/accounts.h"
+#include "platform/shared/failure.h"
 
 using kova::host::Account;
 

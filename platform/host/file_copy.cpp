@@ -10,8 +10,8 @@
 
 #include <kova/fs.h>
 
-#include "platform/base/failure.h"
 #include "platform/host/files.h"
+#include "platform/shared/failure.h"
 
 using kova::host::Fd;
 

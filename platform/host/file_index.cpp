@@ -1,8 +1,8 @@
 #include <kova/file_index.h>
 
-#include "platform/base/failure.h"
-#include "platform/base/index_paths.h"
-#include "platform/base/records.h"
+#include "platform/shared/failure.h"
+#include "platform/shared/index_paths.h"
+#include "platform/shared/records.h"
 
 namespace {
 

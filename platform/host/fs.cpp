@@ -9,9 +9,9 @@
 
 #include <kova/fs.h>
 
-#include "platform/base/failure.h"
 #include "platform/host/mounts.h"
 #include "platform/host/share_table.h"
+#include "platform/shared/failure.h"
 
 namespace {
 

@@ -16,11 +16,11 @@
 #include <kova/instance.h>
 #include <kova/notifyd.h>
 
-#include "platform/base/failure.h"
-#include "platform/base/index_paths.h"
-#include "platform/base/monitor_document.h"
 #include "platform/host/files.h"
 #include "platform/host/log.h"
+#include "platform/shared/failure.h"
+#include "platform/shared/index_paths.h"
+#include "platform/shared/monitor_document.h"
 
 namespace kova::host {
 

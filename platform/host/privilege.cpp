@@ -13,8 +13,8 @@
 
 #include <kova/fs.h>
 
-#include "platform/base/failure.h"
 #include "platform/host/accounts.h"
+#include "platform/shared/failure.h"
 
 namespace kova::host {
 

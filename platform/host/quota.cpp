@@ -11,8 +11,8 @@
 #include <kova/instance.h>
 #include <kova/share.h>
 
-#include "platform/base/failure.h"
 #include "platform/host/files.h"
+#include "platform/shared/failure.h"
 
 using kova::host::Fd;
 

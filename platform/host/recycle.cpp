@@ -7,9 +7,9 @@
 
 #include <kova/recycle.h>
 
-#include "platform/base/failure.h"
 #include "platform/host/account_source.h"
 #include "platform/host/share_table.h"
+#include "platform/shared/failure.h"
 
 using kova::host::ShareEntry;
 using kova::host::ShareTable;

@@ -13,9 +13,9 @@
 
 #include <kova/service.h>
 
-#include "platform/base/arguments.h"
-#include "platform/base/failure.h"
 #include "platform/host/files.h"
+#include "platform/shared/arguments.h"
+#include "platform/shared/failure.h"
 
 namespace kova::host {
 

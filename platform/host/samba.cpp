@@ -12,7 +12,6 @@
 
 #include <kova/samba.h>
 
-#include "platform/base/failure.h"
 #include "platform/host/configuration.h"
 #include "platform/host/files.h"
 #include "platform/host/log.h"
@@ -21,6 +20,7 @@
 #include "platform/host/share_table.h"
 #include "platform/host/smb_conf.h"
 #include "platform/host/stat_cache.h"
+#include "platform/shared/failure.h"
 
 using kova::host::LogChange;
 using kova::host::SmbConf;

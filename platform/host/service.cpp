@@ -6,9 +6,9 @@
 #include <kova/instance.h>
 #include <kova/service.h>
 
-#include "platform/base/failure.h"
 #include "platform/host/child_service.h"
 #include "platform/host/run_program.h"
+#include "platform/shared/failure.h"
 
 using kova::host::ServiceRow;
 

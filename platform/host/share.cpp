@@ -3,10 +3,10 @@
 #include <kova/fs.h>
 #include <kova/share.h>
 
-#include "platform/base/failure.h"
-#include "platform/base/records.h"
 #include "platform/host/privilege.h"
 #include "platform/host/share_table.h"
+#include "platform/shared/failure.h"
+#include "platform/shared/records.h"
 
 using kova::host::ShareEntry;
 using kova::host::ShareTable;

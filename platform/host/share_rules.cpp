@@ -11,8 +11,8 @@
 #include <kova/fs.h>
 #include <kova/instance.h>
 
-#include "platform/base/path_match.h"
 #include "platform/host/files.h"
+#include "platform/shared/path_match.h"
 
 namespace kova::host {
 

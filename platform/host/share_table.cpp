@@ -14,13 +14,13 @@
 #include <kova/error.h>
 #include <kova/instance.h>
 
-#include "platform/base/failure.h"
 #include "platform/host/files.h"
 #include "platform/host/json_members.h"
 #include "platform/host/log.h"
 #include "platform/host/samba_shares.h"
 #include "platform/host/share_rules.h"
 #include "platform/host/stat_cache.h"
+#include "platform/shared/failure.h"
 
 namespace kova::host {
 

@@ -12,9 +12,9 @@
 
 #include <kova/fs.h>
 
-#include "platform/base/failure.h"
 #include "platform/host/files.h"
 #include "platform/host/mounts.h"
+#include "platform/shared/failure.h"
 
 using kova::host::Fd;
 

@@ -2,7 +2,7 @@
 
 #include <kova/sock_connection.h>
 
-#include "platform/base/frames.h"
+#include "platform/shared/frames.h"
 
 namespace kovadaemon {
 

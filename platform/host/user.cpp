@@ -2,11 +2,11 @@
 
 #include <kova/user.h>
 
-#include "platform/base/failure.h"
-#include "platform/base/records.h"
 #include "platform/host/accounts.h"
 #include "platform/host/configuration.h"
 #include "platform/host/share_table.h"
+#include "platform/shared/failure.h"
+#include "platform/shared/records.h"
 
 using kova::host::Account;
 

@@ -6,7 +6,7 @@
 #include <utility>
 #include <vector>
 
-#include "common/unique_fd.h"
+#include "base/unique_fd.h"
 
 namespace ferrox::indexd {
 
@@ -30,8 +30,8 @@ class FileWatch {
 
   std::set<std::pair<int, std::string>> watched_;  ///< the watch of a folder, and a name in it
   bool sees_changes_ = true;                       ///< of all files
-  UniqueFd inotify_;
-  UniqueFd wake_;
+  base::UniqueFd inotify_;
+  base::UniqueFd wake_;
 };
 
 }  // namespace ferrox::indexd

@@ -9,11 +9,11 @@
 #include <memory>
 #include <thread>
 
+#include "base/scope_exit.h"
 #include "common/error.h"
 #include "common/json_util.h"
 #include "common/log.h"
 #include "common/paths.h"
-#include "common/scope_exit.h"
 #include "fileindex/status_mgr.h"
 #include "services/support/json_command.h"
 #include "services/support/settings_problem.h"
@@ -179,7 +179,7 @@ Json::Value IndexDaemon::OnSync(const Json::Value& data) {
     throw Error(Error::kBadArgument, "timeout_ms is not from 0 to " + std::to_string(kSyncTimeoutMaxMs));
   }
   const auto end = std::chrono::steady_clock::now() + std::chrono::milliseconds(timeout_ms);
-  const ScopeExit count([this] { --syncs_; });
+  const base::ScopeExit count([this] { --syncs_; });
   if (++syncs_ > kSyncsMax) throw Error(Error::kInternal, "too many wait for their changes already; ask again");
   const std::string problems = syncs_ended_ ? kStopping : workers_.Sync(ShareNames(data), end);
   if (!problems.empty()) throw Error(Error::kInternal, problems);

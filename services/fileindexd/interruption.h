@@ -7,7 +7,7 @@
 #include <set>
 
 #include "common/clock.h"
-#include "platform/base/frames.h"
+#include "platform/shared/frames.h"
 
 namespace ferrox::indexd {
 

@@ -8,10 +8,10 @@
 #include <cstring>
 #include <memory>
 
+#include "base/unique_fd.h"
 #include "common/error.h"
 #include "common/file_util.h"
 #include "common/log.h"
-#include "common/unique_fd.h"
 #include "services/fileindexd/file_count.h"
 #include "services/fileindexd/queue_tail.h"
 #include "services/fileindexd/stray_documents.h"
@@ -291,7 +291,7 @@ void OperationRunner::LookFullReindex(const std::string&, const std::string&) {
 
 /// Whether a folder can be read of which the index knows no content: its permissions may just have been opened.
 bool OperationRunner::BecameReadable(const std::string& folder) {
-  const UniqueFd opened(open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
+  const base::UniqueFd opened(open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
   return opened.Valid() && context_.index.List(folder, "", 1).empty();
 }
 

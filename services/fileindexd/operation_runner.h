@@ -9,8 +9,8 @@
 #include <string>
 #include <vector>
 
-#include "fileindex/optree.h"
-#include "fileindex/path_table.h"
+#include "base/path_table.h"
+#include "fileindex/optree/optree.h"
 #include "services/fileindexd/change_follower.h"
 #include "services/fileindexd/comparison.h"
 #include "services/fileindexd/document_mover.h"
@@ -131,7 +131,7 @@ class OperationRunner {
   RemovalBatch gone_trees_;
   RemovalBatch gone_;
   const std::set<std::string> ahead_before_;  ///< written ahead of this pass
-  fileindex::PathTable<bool> compared_;
+  base::PathTable<bool> compared_;
   bool had_reindex_ = false;
   std::chrono::steady_clock::time_point last_commit_ = std::chrono::steady_clock::now();
   ChangeFollower follower_;

@@ -3,8 +3,8 @@
 #include <set>
 #include <string>
 
+#include "base/path_table.h"
 #include "common/file_util.h"
-#include "fileindex/path_table.h"
 
 namespace ferrox::indexd {
 
@@ -27,7 +27,7 @@ class PathsUnderWay {
   size_t Count() const { return paths_.Size(); }
 
  private:
-  fileindex::PathTable<bool> paths_;
+  base::PathTable<bool> paths_;
   std::set<std::string> ordered_;
 };
 

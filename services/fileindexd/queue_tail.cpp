@@ -8,9 +8,9 @@
 
 #include <json/value.h>
 
+#include "base/unique_fd.h"
 #include "common/error.h"
-#include "common/unique_fd.h"
-#include "fileindex/optree.h"
+#include "fileindex/optree/optree.h"
 
 namespace ferrox::indexd {
 
@@ -48,7 +48,7 @@ void TakeNumbers(const std::string& line, std::set<uint64_t>& files) {
 /// Hands out whole lines of one piece of a queue file from an offset on, until `take` has enough. @return the offset
 /// behind the last; as it was at the end.
 off_t ReadQueueLines(const std::string& path, off_t at, const std::function<bool(const std::string& line)>& take) {
-  const UniqueFd file(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK));
+  const base::UniqueFd file(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK));
   std::string chunk(kChunkBytes, '\0');
   const ssize_t size = file.Valid() ? pread(file.Get(), chunk.data(), chunk.size(), at) : 0;
   chunk.resize(size > 0 ? static_cast<size_t>(size) : 0);

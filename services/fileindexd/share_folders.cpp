@@ -8,7 +8,7 @@
 #include "common/error.h"
 #include "common/file_util.h"
 #include "common/json_util.h"
-#include "fileindex/folder_mgr.h"
+#include "fileindex/folders/folder_mgr.h"
 #include "fileindex/util.h"
 #include "sdk/share.h"
 

@@ -6,7 +6,7 @@
 #include <string>
 #include <vector>
 
-#include "common/unique_fd.h"
+#include "base/unique_fd.h"
 
 namespace ferrox::indexd {
 
@@ -37,7 +37,7 @@ class HeldFolder {
 
  private:
   const std::string& path_;
-  UniqueFd fd_;
+  base::UniqueFd fd_;
 };
 
 }  // namespace ferrox::indexd

@@ -10,15 +10,15 @@
 #include <utility>
 #include <vector>
 
+#include "base/unique_fd.h"
 #include "common/clock.h"
 #include "common/error.h"
 #include "common/file_util.h"
 #include "common/lock_file.h"
 #include "common/log.h"
 #include "common/paths.h"
-#include "common/unique_fd.h"
-#include "fileindex/optree.h"
-#include "fileindex/queue_mgr.h"
+#include "fileindex/optree/optree.h"
+#include "fileindex/queue/queue_mgr.h"
 #include "fileindex/status_mgr.h"
 #include "fileindex/util.h"
 #include "sdk/share.h"
@@ -54,7 +54,7 @@ bool HasContent(const std::string& path) {
 
 /// The lines of a queue file; of a long one, as many as its beginning lets expect.
 uint64_t CountLines(const std::string& path) {
-  const UniqueFd file(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK));
+  const base::UniqueFd file(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK));
   struct stat status = {};
   if (!file.Valid() || fstat(file.Get(), &status) != 0 || status.st_size == 0) return 0;
   std::string begin(size_t{1} << 20, '\0');

@@ -10,7 +10,7 @@
 #include <set>
 #include <string_view>
 
-#include "common/unique_fd.h"
+#include "base/unique_fd.h"
 
 namespace ferrox::indexd {
 
@@ -23,7 +23,7 @@ struct TreeWalk::Item {
 
 /// One folder on the way: its names one after the other, each with a "/" behind it, and their order.
 struct TreeWalk::Level {
-  UniqueFd folder;
+  base::UniqueFd folder;
   dev_t device = 0;
   bool indexed = false;  ///< the folder, and so all in it; else it is on the way to what is
   std::string prefix;

@@ -8,7 +8,7 @@
 
 #include "common/error.h"
 #include "common/log.h"
-#include "fileindex/watch_list.h"
+#include "fileindex/operations/watch_list.h"
 #include "sdk/share.h"
 
 namespace ferrox::indexd {

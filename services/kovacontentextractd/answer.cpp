@@ -8,10 +8,10 @@
 #include "common/json_scan.h"
 #include "common/json_util.h"
 #include "fileindex/elastic/elastic_control.h"
-#include "fileindex/elastic/fields.h"
 #include "services/kovacontentextractd/readers/reader.h"
 #include "services/kovacontentextractd/readers/utf8.h"
 #include "services/kovacontentextractd/worker_protocol.h"
+#include "wire/fields.h"
 
 namespace ferrox::extract {
 

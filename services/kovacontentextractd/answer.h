@@ -7,14 +7,14 @@
 
 #include <json/value.h>
 
-#include "common/unique_fd.h"
+#include "base/unique_fd.h"
 
 namespace ferrox::extract {
 
 /// A file within the file that was read.
 struct AttachedFile {
-  std::string name;  ///< for hints
-  UniqueFd file;     ///< in memory; nobody can change it
+  std::string name;     ///< for hints
+  base::UniqueFd file;  ///< in memory; nobody can change it
 };
 
 /// What a worker found, as far as it can be believed.

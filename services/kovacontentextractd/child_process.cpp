@@ -11,7 +11,7 @@
 #include <utility>
 #include <vector>
 
-#include "common/unique_fd.h"
+#include "base/unique_fd.h"
 
 namespace ferrox::extract {
 
@@ -52,7 +52,7 @@ size_t ChildProcess::Held() {
 
 std::optional<int> ChildProcess::Wait(milliseconds longest) {
   if (pid_ <= 0) return std::nullopt;
-  const UniqueFd process(static_cast<int>(syscall(SYS_pidfd_open, pid_, 0)));
+  const base::UniqueFd process(static_cast<int>(syscall(SYS_pidfd_open, pid_, 0)));
   pollfd state = {process.Get(), POLLIN, 0};
   const auto end = SteadyClock::now() + longest;
   for (;;) {

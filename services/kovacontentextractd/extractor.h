@@ -7,7 +7,7 @@
 
 #include <json/value.h>
 
-#include "common/unique_fd.h"
+#include "base/unique_fd.h"
 #include "services/kovacontentextractd/open_limit.h"
 #include "services/kovacontentextractd/worker_pool.h"
 #include "services/support/frame_server.h"
@@ -52,7 +52,7 @@ class Extractor {
 
  private:
   struct OpenedFile {
-    UniqueFd fd;
+    base::UniqueFd fd;
     int problem = 0;     ///< an error number
     uint64_t inode = 0;  ///< 0: unknown
     bool regular = false;

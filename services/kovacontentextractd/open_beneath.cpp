@@ -23,8 +23,8 @@ int AskKernel(int root, const char* below, int flags) {
 }
 
 /// A link in the place of a folder is ENOTDIR to the kernel here; it is told as what it is.
-UniqueFd StepInto(int folder, const char* name) {
-  UniqueFd next(openat(folder, name, kFolderFlags));
+base::UniqueFd StepInto(int folder, const char* name) {
+  base::UniqueFd next(openat(folder, name, kFolderFlags));
   struct stat info = {};
   if (!next.Valid() && errno == ENOTDIR) {
     const bool is_link = fstatat(folder, name, &info, AT_SYMLINK_NOFOLLOW) == 0 && S_ISLNK(info.st_mode);
@@ -34,7 +34,7 @@ UniqueFd StepInto(int folder, const char* name) {
 }
 
 int Walk(int root, const std::string& below, int flags) {
-  UniqueFd folder(openat(root, ".", kFolderFlags));
+  base::UniqueFd folder(openat(root, ".", kFolderFlags));
   size_t begin = 0;
   for (size_t slash; folder.Valid() && (slash = below.find('/', begin)) != std::string::npos; begin = slash + 1) {
     const std::string name = below.substr(begin, slash - begin);
@@ -56,16 +56,16 @@ int Open(int root, const std::string& below, int flags, bool may_ask_kernel) {
 
 }  // namespace
 
-UniqueFd OpenBeneath(const std::string& root, const std::string& path, bool may_ask_kernel) {
+base::UniqueFd OpenBeneath(const std::string& root, const std::string& path, bool may_ask_kernel) {
   const bool is_below = path.size() > root.size() + 1 && path.compare(0, root.size(), root) == 0 &&
                         path[root.size()] == '/' && path.find('\0') == std::string::npos;
-  if (!is_below) return errno = EINVAL, UniqueFd();
-  const UniqueFd folder(open(root.empty() ? "/" : root.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
-  if (!folder.Valid()) return UniqueFd();
+  if (!is_below) return errno = EINVAL, base::UniqueFd();
+  const base::UniqueFd folder(open(root.empty() ? "/" : root.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
+  if (!folder.Valid()) return base::UniqueFd();
   const std::string below = path.substr(root.size() + 1);
   int fd = Open(folder.Get(), below, kFileFlags | O_NOATIME, may_ask_kernel);
   if (fd < 0 && errno == EPERM) fd = Open(folder.Get(), below, kFileFlags, may_ask_kernel);
-  return UniqueFd(fd);
+  return base::UniqueFd(fd);
 }
 
 }  // namespace ferrox::extract

@@ -2,7 +2,7 @@
 
 #include <string>
 
-#include "common/unique_fd.h"
+#include "base/unique_fd.h"
 
 namespace ferrox::extract {
 
@@ -11,6 +11,6 @@ namespace ferrox::extract {
 /// last access where that is allowed. Not valid, with errno, when that cannot be: ELOOP or EXDEV for a link, EINVAL for
 /// a path that is not below the root.
 /// @param may_ask_kernel false: walk from folder to folder, as on kernels that cannot do it in one call
-UniqueFd OpenBeneath(const std::string& root, const std::string& path, bool may_ask_kernel = true);
+base::UniqueFd OpenBeneath(const std::string& root, const std::string& path, bool may_ask_kernel = true);
 
 }  // namespace ferrox::extract

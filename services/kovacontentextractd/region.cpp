@@ -21,20 +21,20 @@ namespace {
 constexpr unsigned kNeverExecuted = 8;  // MFD_NOEXEC_SEAL, of Linux 6.3
 constexpr size_t kCharacterMaxBytes = 4;
 
-UniqueFd MakeMemory() {
+base::UniqueFd MakeMemory() {
   constexpr char kName[] = "kovacontentextractd";
-  UniqueFd memory(memfd_create(kName, MFD_CLOEXEC | MFD_ALLOW_SEALING | kNeverExecuted));
+  base::UniqueFd memory(memfd_create(kName, MFD_CLOEXEC | MFD_ALLOW_SEALING | kNeverExecuted));
   if (!memory.Valid() && errno == EINVAL) memory.Reset(memfd_create(kName, MFD_CLOEXEC | MFD_ALLOW_SEALING));
   return memory;
 }
 
 }  // namespace
 
-UniqueFd MakeRegion() {
-  UniqueFd region = MakeMemory();
+base::UniqueFd MakeRegion() {
+  base::UniqueFd region = MakeMemory();
   const bool made = region.Valid() && ftruncate(region.Get(), kRegionBytes) == 0 &&
                     fcntl(region.Get(), F_ADD_SEALS, F_SEAL_GROW | F_SEAL_SHRINK | F_SEAL_SEAL) == 0;
-  return made ? std::move(region) : UniqueFd();
+  return made ? std::move(region) : base::UniqueFd();
 }
 
 bool CopyText(int region, size_t bytes, const TextSink& sink) {
@@ -56,16 +56,16 @@ bool CopyText(int region, size_t bytes, const TextSink& sink) {
   return kept == 0;
 }
 
-UniqueFd CopyAttachment(int region, size_t offset, size_t bytes) {
-  UniqueFd memory = MakeMemory();
+base::UniqueFd CopyAttachment(int region, size_t offset, size_t bytes) {
+  base::UniqueFd memory = MakeMemory();
   auto from = static_cast<off_t>(offset);
   for (size_t left = memory.Valid() ? bytes : 0; left > 0;) {
     const ssize_t copied = sendfile(memory.Get(), region, &from, left);
-    if (copied <= 0) return UniqueFd();
+    if (copied <= 0) return base::UniqueFd();
     left -= static_cast<size_t>(copied);
   }
   constexpr int kSeals = F_SEAL_GROW | F_SEAL_SHRINK | F_SEAL_WRITE | F_SEAL_SEAL;
-  return memory.Valid() && fcntl(memory.Get(), F_ADD_SEALS, kSeals) == 0 ? std::move(memory) : UniqueFd();
+  return memory.Valid() && fcntl(memory.Get(), F_ADD_SEALS, kSeals) == 0 ? std::move(memory) : base::UniqueFd();
 }
 
 void FreeAttachments(int region, size_t bytes) {

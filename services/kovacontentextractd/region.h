@@ -4,7 +4,7 @@
 #include <functional>
 #include <string_view>
 
-#include "common/unique_fd.h"
+#include "base/unique_fd.h"
 
 namespace ferrox::extract {
 
@@ -13,7 +13,7 @@ using TextSink = std::function<void(size_t offset, std::string_view piece)>;
 
 /// Makes the memory that a worker shares with the daemon: kRegionBytes, whose size nobody can change. Not valid, with
 /// errno, when there is none.
-UniqueFd MakeRegion();
+base::UniqueFd MakeRegion();
 
 /// Hands on the text at the beginning of a worker's region. The worker may write there at any time, so the text is
 /// copied first, and what has been copied is checked.
@@ -22,7 +22,7 @@ bool CopyText(int region, size_t bytes, const TextSink& sink);
 
 /// Copies an attachment out of a worker's region into memory of its own, which nobody can change afterwards. Not valid,
 /// with errno, when there is none.
-UniqueFd CopyAttachment(int region, size_t offset, size_t bytes);
+base::UniqueFd CopyAttachment(int region, size_t offset, size_t bytes);
 
 /// Gives back what the attachments in a region, of so many bytes together, took of the system's memory.
 void FreeAttachments(int region, size_t bytes);

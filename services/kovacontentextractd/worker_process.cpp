@@ -42,9 +42,9 @@ WorkerProcess::WorkerProcess(WorkerTemplate& prepared) : region_(MakeRegion()) {
   int ends[2];
   FERROX_FAIL_IF(socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, ends) != 0, Error::kInternal,
                  "socketpair: " + ErrnoText());
-  socket_ = UniqueFd(ends[0]);
+  socket_ = base::UniqueFd(ends[0]);
   {
-    const UniqueFd theirs(ends[1]);  // gone before the greeting is waited for, so that its end is noticed
+    const base::UniqueFd theirs(ends[1]);  // gone before the greeting is waited for, so that its end is noticed
     process_.Take(prepared.Fork(theirs.Get(), region_.Get()));
   }
   RawAnswer greeting;

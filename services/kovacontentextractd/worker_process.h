@@ -7,7 +7,7 @@
 
 #include <json/value.h>
 
-#include "common/unique_fd.h"
+#include "base/unique_fd.h"
 #include "services/kovacontentextractd/child_process.h"
 
 namespace ferrox::extract {
@@ -66,8 +66,8 @@ class WorkerProcess {
   Outcome ReceiveSome(char* to, size_t room, TimePoint end, size_t& have);
   Outcome HowItEnded();
 
-  UniqueFd socket_;
-  UniqueFd region_;
+  base::UniqueFd socket_;
+  base::UniqueFd region_;
   ChildProcess process_;
   Json::Value missing_ = Json::Value(Json::arrayValue);
   uint32_t requests_ = 0;

@@ -11,9 +11,9 @@
 #include <cstring>
 #include <string_view>
 
+#include "base/scope_exit.h"
 #include "common/error.h"
 #include "common/log.h"
-#include "common/scope_exit.h"
 #include "services/kovacontentextractd/worker_protocol.h"
 #include "services/support/descriptor_passing.h"
 
@@ -29,7 +29,7 @@ int Spawn(const std::string& program, const std::string& empty_folder, int socke
   posix_spawnattr_t attributes;
   (void)posix_spawn_file_actions_init(&actions);
   (void)posix_spawnattr_init(&attributes);
-  const ScopeExit free_both([&] {
+  const base::ScopeExit free_both([&] {
     (void)posix_spawn_file_actions_destroy(&actions);
     (void)posix_spawnattr_destroy(&attributes);
   });
@@ -56,9 +56,9 @@ WorkerTemplate::WorkerTemplate(const std::string& program, const std::string& em
   int ends[2];
   FERROX_FAIL_IF(socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, ends) != 0, Error::kInternal,
                  "socketpair: " + ErrnoText());
-  socket_ = UniqueFd(ends[0]);
+  socket_ = base::UniqueFd(ends[0]);
   // A descriptor that had its number already would keep its close-on-exec flag.
-  const UniqueFd theirs(fcntl(ends[1], F_DUPFD_CLOEXEC, kWorkerSocket + 1));
+  const base::UniqueFd theirs(fcntl(ends[1], F_DUPFD_CLOEXEC, kWorkerSocket + 1));
   (void)close(ends[1]);
   pid_t pid = -1;
   const int error = theirs.Valid() ? Spawn(program, empty_folder, theirs.Get(), pid) : errno;

@@ -4,7 +4,7 @@
 
 #include <string>
 
-#include "common/unique_fd.h"
+#include "base/unique_fd.h"
 #include "services/kovacontentextractd/child_process.h"
 
 namespace ferrox::extract {
@@ -26,7 +26,7 @@ class WorkerTemplate {
 
  private:
   std::string program_;
-  UniqueFd socket_;
+  base::UniqueFd socket_;
   ChildProcess process_;
 };
 

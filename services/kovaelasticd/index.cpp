@@ -4,8 +4,8 @@
 #include <syslog.h>
 #include <unistd.h>
 
+#include "base/unique_fd.h"
 #include "common/log.h"
-#include "common/unique_fd.h"
 #include "services/kovaelasticd/sqlite_db.h"
 
 namespace ferrox::engine {
@@ -191,7 +191,7 @@ void Index::CommitByItself() {
 
 void Index::Mark() {
   if (marked_) return;
-  const UniqueFd marker(open(marker_path_.c_str(), O_WRONLY | O_CREAT | O_CLOEXEC | O_NOFOLLOW, 0600));
+  const base::UniqueFd marker(open(marker_path_.c_str(), O_WRONLY | O_CREAT | O_CLOEXEC | O_NOFOLLOW, 0600));
   marked_ = marker.Valid();
 }
 

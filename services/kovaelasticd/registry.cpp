@@ -4,11 +4,11 @@
 
 #include <cerrno>
 
+#include "base/scope_exit.h"
 #include "common/clock.h"
 #include "common/file_util.h"
 #include "common/json_util.h"
 #include "common/log.h"
-#include "common/scope_exit.h"
 #include "services/kovaelasticd/index_files.h"
 #include "services/kovaelasticd/sqlite_db.h"
 #include "services/kovaelasticd/sqlite_store.h"
@@ -340,7 +340,7 @@ void Registry::Move(const std::string& id, const std::string& new_id, const std:
     entry->next_path = to_path;
     Save();  // a restart in the midst of it finishes what was begun
   }
-  const ScopeExit finish([this, &id] { FinishMove(id); });
+  const base::ScopeExit finish([this, &id] { FinishMove(id); });
   if (to_path != entry->path && at_source) MoveIndexFiles(entry->path, to_path);
 }
 

@@ -2,7 +2,7 @@
 
 #include <string>
 
-#include "common/unique_fd.h"
+#include "base/unique_fd.h"
 
 namespace ferrox::notifyd {
 
@@ -19,7 +19,7 @@ class Cookie {
 
  private:
   std::string path_;
-  UniqueFd file_;
+  base::UniqueFd file_;
 };
 
 }  // namespace ferrox::notifyd

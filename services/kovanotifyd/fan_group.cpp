@@ -233,17 +233,17 @@ bool FanGroup::IsSameFileSystem(const HandleKey& a, const HandleKey& b) {
   return !a.empty() && !b.empty() && a.compare(0, NumberLength(a), b, 0, NumberLength(b)) == 0;
 }
 
-UniqueFd FanGroup::OpenKey(const HandleKey& key, int mount, int flags) {
+base::UniqueFd FanGroup::OpenKey(const HandleKey& key, int mount, int flags) {
   const size_t type_at = key.empty() ? 0 : NumberLength(key);
   if (key.size() < type_at + 1 || key.size() - type_at - 1 > MAX_HANDLE_SZ) {
     errno = EINVAL;
-    return UniqueFd();
+    return base::UniqueFd();
   }
   HandleBuffer buffer;
   buffer.Get()->handle_bytes = static_cast<unsigned>(key.size() - type_at - 1);
   buffer.Get()->handle_type = static_cast<unsigned char>(key[type_at]);
   std::memcpy(buffer.bytes + kHandleHeader, key.data() + type_at + 1, key.size() - type_at - 1);
-  return UniqueFd(open_by_handle_at(mount, buffer.Get(), flags | O_CLOEXEC));
+  return base::UniqueFd(open_by_handle_at(mount, buffer.Get(), flags | O_CLOEXEC));
 }
 
 }  // namespace ferrox::notifyd

@@ -10,7 +10,7 @@
 #include <string_view>
 #include <vector>
 
-#include "common/unique_fd.h"
+#include "base/unique_fd.h"
 
 namespace ferrox::notifyd {
 
@@ -94,7 +94,7 @@ class FanGroup {
   static bool IsSameFileSystem(const HandleKey& a, const HandleKey& b);
   /// Opens what the key stands for; `mount` is any folder open on its file system. Not valid with errno set, ESTALE
   /// when it is removed. Needs CAP_DAC_READ_SEARCH.
-  static UniqueFd OpenKey(const HandleKey& key, int mount, int flags);
+  static base::UniqueFd OpenKey(const HandleKey& key, int mount, int flags);
 
   /// Reads the records in a kernel's answer, as far as they are whole. For Read and tests.
   void Parse(const char* bytes, size_t size, std::vector<FanRecord>& records);
@@ -107,7 +107,7 @@ class FanGroup {
   size_t Number(const FileSystemId& id);
   bool ParseInfo(const char* info, size_t size, FanRecord& record);
 
-  UniqueFd fd_;
+  base::UniqueFd fd_;
   std::unique_ptr<char[]> buffer_;
   std::vector<FileSystemId> file_systems_;
   size_t last_number_ = 0;

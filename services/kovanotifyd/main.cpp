@@ -7,8 +7,8 @@
 
 #include <kova/log.h>
 
+#include "base/scope_exit.h"
 #include "common/paths.h"
-#include "common/scope_exit.h"
 #include "platform/host/configuration.h"
 #include "platform/host/notify_registry.h"
 #include "services/kovanotifyd/commands.h"
@@ -80,7 +80,7 @@ int main(int argc, char** argv) try {
                                          return ferrox::notifyd::HandleCommand(notifier, request, peer);
                                        });
   std::thread server_thread([&] { server.Run(daemon.StopFd()); });
-  const ferrox::ScopeExit stop([&] {
+  const base::ScopeExit stop([&] {
     server.Stop();
     server_thread.join();
   });

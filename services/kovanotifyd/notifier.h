@@ -10,7 +10,7 @@
 #include <string>
 #include <vector>
 
-#include "common/unique_fd.h"
+#include "base/unique_fd.h"
 #include "services/kovanotifyd/cookie.h"
 #include "services/kovanotifyd/queues/queue_router.h"
 #include "services/kovanotifyd/registry.h"
@@ -120,7 +120,7 @@ class Notifier : private WatchSet::Listener {
   std::mutex mutex_;  ///< guards the two below
   std::vector<Task> tasks_;
   bool is_closed_ = false;
-  UniqueFd wake_;
+  base::UniqueFd wake_;
 };
 
 }  // namespace ferrox::notifyd

@@ -5,7 +5,7 @@
 #include <string>
 #include <vector>
 
-#include "common/unique_fd.h"
+#include "base/unique_fd.h"
 #include "services/kovanotifyd/queues/queue_router.h"
 
 namespace ferrox::notifyd {
@@ -42,7 +42,7 @@ class RegistryWatch {
 
  private:
   std::string folder_;
-  UniqueFd inotify_;
+  base::UniqueFd inotify_;
 };
 
 }  // namespace ferrox::notifyd

@@ -30,14 +30,14 @@ namespace ferrox::services {
 
 namespace {
 
-UniqueFd BlockSignals() {
+base::UniqueFd BlockSignals() {
   (void)signal(SIGPIPE, SIG_IGN);
   sigset_t set;
   (void)sigemptyset(&set);
   for (const int number : {SIGTERM, SIGINT}) (void)sigaddset(&set, number);
   (void)pthread_sigmask(SIG_BLOCK, &set, nullptr);
   (void)signal(SIGHUP, SIG_IGN);
-  return UniqueFd(signalfd(-1, &set, SFD_CLOEXEC | SFD_NONBLOCK));
+  return base::UniqueFd(signalfd(-1, &set, SFD_CLOEXEC | SFD_NONBLOCK));
 }
 
 /// The threads of a daemon need little of it, and there are many; where address space is short, it would be gone.
@@ -68,9 +68,9 @@ bool LockWithPatience(int fd, const std::string& path) {
 std::string PidPath(const std::string& name) { return InstancePath(("/var/run/" + name + ".pid").c_str()); }
 
 /// The pid file of a running process is locked by it; what is written in it is only for people.
-UniqueFd TakePidFile(const std::string& path, const std::string& name) {
+base::UniqueFd TakePidFile(const std::string& path, const std::string& name) {
   FERROX_FAIL_IF(!kova::MakeLockFilePrivate(path), Error::kInternal, "cannot make " + path + ": " + ErrnoText());
-  UniqueFd file;
+  base::UniqueFd file;
   do {  // it may just have been replaced
     file.Reset(open(path.c_str(), O_RDWR | O_CREAT | O_CLOEXEC | O_NOFOLLOW, 0600));
     FERROX_FAIL_IF(!file.Valid(), Error::kInternal, "cannot open " + path + ": " + ErrnoText());
@@ -131,7 +131,7 @@ void Daemon::NotifyReady() {
   target.sun_family = AF_UNIX;
   memcpy(target.sun_path, address, strlen(address));
   if (target.sun_path[0] == '@') target.sun_path[0] = '\0';
-  const UniqueFd sender(socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
+  const base::UniqueFd sender(socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
   const char ready[] = "READY=1";
   const auto length = static_cast<socklen_t>(offsetof(sockaddr_un, sun_path) + strlen(address));
   (void)sendto(sender.Get(), ready, sizeof(ready) - 1, MSG_NOSIGNAL, reinterpret_cast<const sockaddr*>(&target),

@@ -2,7 +2,7 @@
 
 #include <string>
 
-#include "common/unique_fd.h"
+#include "base/unique_fd.h"
 
 namespace ferrox::services {
 
@@ -27,8 +27,8 @@ class Daemon {
 
  private:
   std::string name_;
-  UniqueFd pid_file_;
-  UniqueFd stop_fd_;
+  base::UniqueFd pid_file_;
+  base::UniqueFd stop_fd_;
 };
 
 /// Keeps others from the lock files that all processes of the instance share (kova/lock_holder.h).

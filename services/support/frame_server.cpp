@@ -51,7 +51,7 @@ sockaddr_un AddressOf(const std::string& path) {
 
 /// A socket file that nobody serves is left over from a dead process.
 void RemoveStaleSocket(const std::string& path, const sockaddr_un& address) {
-  const UniqueFd probe(socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0));
+  const base::UniqueFd probe(socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0));
   const bool served =
       connect(probe.Get(), reinterpret_cast<const sockaddr*>(&address), static_cast<socklen_t>(sizeof(address))) == 0;
   FERROX_FAIL_IF(served, Error::kInternal, path + " is served by another process; stop it first");
@@ -59,10 +59,10 @@ void RemoveStaleSocket(const std::string& path, const sockaddr_un& address) {
   if (lstat(path.c_str(), &status) == 0 && S_ISSOCK(status.st_mode)) (void)unlink(path.c_str());
 }
 
-UniqueFd Listen(const std::string& path, mode_t mode) {
+base::UniqueFd Listen(const std::string& path, mode_t mode) {
   const sockaddr_un address = AddressOf(path);
   RemoveStaleSocket(path, address);
-  UniqueFd listener(socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0));
+  base::UniqueFd listener(socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0));
   FERROX_FAIL_IF(!listener.Valid(), Error::kInternal, "socket: " + ErrnoText());
   (void)fchmod(listener.Get(), mode);  // what bind gives the file; chmod makes it certain whatever the umask
   const bool listening =
@@ -87,10 +87,10 @@ struct Connection {
   enum class State { kReceiving, kSending };
 
   uint64_t id = 0;
-  UniqueFd fd;
+  base::UniqueFd fd;
   Peer peer;
-  UniqueFd descriptor;  ///< peer.descriptor
-  bool busy = false;    ///< a thread is at work on it
+  base::UniqueFd descriptor;  ///< peer.descriptor
+  bool busy = false;          ///< a thread is at work on it
   State state = State::kReceiving;
   std::array<char, kHeaderBytes> header = {};
   std::string body;  ///< of the request as far as it has come, or of the reply
@@ -221,7 +221,7 @@ class FrameServer::Impl {
   using Connections = std::unordered_map<uint64_t, std::unique_ptr<Connection>>;
   enum class Next { kReceive, kSend, kEnd };
 
-  static void Watch(const UniqueFd& epoll, int operation, int fd, uint64_t id, uint32_t events) {
+  static void Watch(const base::UniqueFd& epoll, int operation, int fd, uint64_t id, uint32_t events) {
     epoll_event event = {};
     event.events = events;
     event.data.u64 = id;
@@ -236,7 +236,7 @@ class FrameServer::Impl {
 
   void Accept() {
     for (;;) {
-      UniqueFd fd(accept4(listener_.Get(), nullptr, nullptr, SOCK_CLOEXEC | SOCK_NONBLOCK));
+      base::UniqueFd fd(accept4(listener_.Get(), nullptr, nullptr, SOCK_CLOEXEC | SOCK_NONBLOCK));
       const bool full = !fd.Valid() && (errno == EMFILE || errno == ENFILE);
       if (!fd.Valid() && !full) return;
       std::unique_lock lock(mutex_);
@@ -247,7 +247,7 @@ class FrameServer::Impl {
     }
   }
 
-  void Add(UniqueFd fd) {
+  void Add(base::UniqueFd fd) {
     auto connection = std::make_unique<Connection>();
     connection->id = next_id_++;
     connection->peer = PeerOf(fd.Get());
@@ -341,10 +341,10 @@ class FrameServer::Impl {
 
   const FrameServerOptions options_;
   const Handler handler_;
-  UniqueFd listener_;
-  UniqueFd control_;  ///< what the accepting thread waits for
-  UniqueFd ready_;    ///< connections that nobody is at work on; what the answering threads wait for
-  UniqueFd stopped_;
+  base::UniqueFd listener_;
+  base::UniqueFd control_;  ///< what the accepting thread waits for
+  base::UniqueFd ready_;    ///< connections that nobody is at work on; what the answering threads wait for
+  base::UniqueFd stopped_;
   std::atomic<bool> stop_{false};
   std::atomic<uint64_t> request_bytes_{0};  ///< of all requests that are not answered yet
   std::mutex mutex_;                        ///< of all below; a connection that is busy is its thread's

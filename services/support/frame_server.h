@@ -8,7 +8,7 @@
 #include <memory>
 #include <string>
 
-#include "common/unique_fd.h"
+#include "base/unique_fd.h"
 
 namespace ferrox::services {
 

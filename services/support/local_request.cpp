@@ -4,7 +4,7 @@
 
 #include <kova/sock_connection.h>
 
-#include "platform/base/frames.h"
+#include "platform/shared/frames.h"
 
 namespace ferrox::services {
 

@@ -6,7 +6,7 @@
 #include <memory>
 #include <thread>
 
-#include "common/unique_fd.h"
+#include "base/unique_fd.h"
 #include "tests/support/library_test.h"
 #include "tests/support/unix_server.h"
 
@@ -80,7 +80,7 @@ TEST_F(CommunicationTest, AMissingDaemonIsAWriteFailure) {
 TEST_F(CommunicationTest, MovesExactlySoManyBytes) {
   int pair[2];
   ASSERT_EQ(socketpair(AF_UNIX, SOCK_STREAM, 0, pair), 0);
-  const UniqueFd near(pair[0]), far(pair[1]);
+  const base::UniqueFd near(pair[0]), far(pair[1]);
   std::vector<unsigned char> sent(300001), got(sent.size());
   for (size_t i = 0; i < sent.size(); ++i) sent[i] = static_cast<unsigned char>(i * 7);
   std::thread writer([&] { BufferWrite(near.Get(), static_cast<unsigned>(sent.size()), sent.data()); });

@@ -16,9 +16,9 @@
 #include <kova/error.h>
 #include <kova/service.h>
 
-#include "platform/base/frames.h"
 #include "platform/host/child_service.h"
 #include "platform/host/service_log.h"
+#include "platform/shared/frames.h"
 #include "tests/support/temp_dir.h"
 
 namespace ferrox::test {

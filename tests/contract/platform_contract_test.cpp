@@ -21,8 +21,8 @@
 #include <kova/sock_connection.h>
 #include <kova/user.h>
 
-#include "platform/base/index_paths.h"
-#include "platform/base/records.h"
+#include "platform/shared/index_paths.h"
+#include "platform/shared/records.h"
 #include "tests/contract/frame_peer.h"
 #include "tests/contract/platform_setup.h"
 #include "tests/support/temp_dir.h"

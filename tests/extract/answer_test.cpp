@@ -8,8 +8,8 @@
 
 #include <gtest/gtest.h>
 
+#include "base/unique_fd.h"
 #include "common/json_util.h"
-#include "common/unique_fd.h"
 #include "services/kovacontentextractd/readers/utf8.h"
 #include "services/kovacontentextractd/region.h"
 
@@ -84,8 +84,8 @@ TEST(AnswerTest, AttachmentsLieBehindEachOtherInTheRegion) {
 }
 
 /// A worker's region that holds `text` at its beginning.
-UniqueFd RegionWith(const std::string& text) {
-  UniqueFd region = extract::MakeRegion();
+base::UniqueFd RegionWith(const std::string& text) {
+  base::UniqueFd region = extract::MakeRegion();
   EXPECT_EQ(static_cast<ssize_t>(text.size()), pwrite(region.Get(), text.data(), text.size(), 0));
   return region;
 }
@@ -94,7 +94,7 @@ TEST(AnswerTest, TextIsHandedOnInWholeCharacters) {
   std::string text;
   for (int i = 0; i < 100000; ++i) text += "a\u00e4\u4e2d";
   std::string copied;
-  const UniqueFd region = RegionWith(text);
+  const base::UniqueFd region = RegionWith(text);
   EXPECT_TRUE(extract::CopyText(region.Get(), text.size(), [&copied](size_t offset, std::string_view piece) {
     EXPECT_EQ(copied.size(), offset);
     EXPECT_EQ(piece.size(), extract::ValidUtf8Prefix(piece));

@@ -30,7 +30,7 @@ class OpenBeneathTest : public testing::TestWithParam<bool> {
 
   std::string Read(const std::string& below) {
     errno = 0;
-    const UniqueFd file = OpenBeneath(dir_ / "share", dir_ / below, GetParam());
+    const base::UniqueFd file = OpenBeneath(dir_ / "share", dir_ / below, GetParam());
     char text[16] = {};
     return file.Valid() && read(file.Get(), text, sizeof(text) - 1) >= 0 ? text : "";
   }

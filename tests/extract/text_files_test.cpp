@@ -14,8 +14,8 @@
 
 #include <kova/content_type.h>
 
+#include "base/unique_fd.h"
 #include "common/file_util.h"
-#include "common/unique_fd.h"
 #include "tests/support/temp_dir.h"
 
 namespace ferrox::test {
@@ -40,7 +40,7 @@ class TextFilesTest : public testing::Test {
  protected:
   Json::Value ParseBytes(const string& name, const string& bytes) {
     WriteFile(dir_ / name, bytes);
-    const UniqueFd file(open((dir_ / name).c_str(), O_RDONLY | O_CLOEXEC));
+    const base::UniqueFd file(open((dir_ / name).c_str(), O_RDONLY | O_CLOEXEC));
     extract::Findings findings;
     const string extension = GetFileExtension(name, true);
     const extract::Reader reader = ReaderOf(extension, bytes);

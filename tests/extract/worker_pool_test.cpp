@@ -11,8 +11,8 @@
 
 #include <gtest/gtest.h>
 
+#include "base/unique_fd.h"
 #include "common/error.h"
-#include "common/unique_fd.h"
 #include "services/kovacontentextractd/sandbox.h"
 #include "tests/support/temp_dir.h"
 
@@ -39,7 +39,7 @@ class WorkerPoolTest : public testing::Test {
   };
   Result Read(WorkerPool& pool, const std::string& reader, const std::string& content = "content") {
     WriteFile(dir_ / "file", content);
-    const UniqueFd file(open((dir_ / "file").c_str(), O_RDONLY | O_CLOEXEC));
+    const base::UniqueFd file(open((dir_ / "file").c_str(), O_RDONLY | O_CLOEXEC));
     Result result;
     const auto sink = [&result](size_t offset, std::string_view piece) {
       result.text.resize(offset);
@@ -165,7 +165,7 @@ TEST_F(WorkerPoolTest, AThousandBadFilesLeaveNothingBehind) {
     std::vector<std::thread> threads;
     for (int t = 0; t < 4; ++t) {
       threads.emplace_back([&] {
-        const UniqueFd file(open((dir_ / "file").c_str(), O_RDONLY | O_CLOEXEC));
+        const base::UniqueFd file(open((dir_ / "file").c_str(), O_RDONLY | O_CLOEXEC));
         constexpr const char* kReaders[] = {"crash", "bytes", "announce", "babble", "be killed"};
         for (int i; (i = --left) >= 0;) {
           const auto drop = [](size_t, std::string_view) {};

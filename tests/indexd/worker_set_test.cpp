@@ -118,7 +118,7 @@ TEST_F(WorkerSetTest, MovedShareGetsANewWorkerAndBrokenFilesChangeNothing) {
 
 /// The engine takes requests, and each answer ends in the middle.
 TEST_F(WorkerSetTest, HungEngineMakesNobodyMute) {
-  std::vector<UniqueFd> held;
+  std::vector<base::UniqueFd> held;
   std::atomic<int> asked{0};
   const auto hang = [&](int fd) {
     (void)send(fd, "\x10\0\0\0{", 5, MSG_NOSIGNAL);

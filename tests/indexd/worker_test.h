@@ -13,7 +13,7 @@
 #include <gtest/gtest.h>
 
 #include "common/json_util.h"
-#include "fileindex/folder_mgr.h"
+#include "fileindex/folders/folder_mgr.h"
 #include "platform/host/share_table.h"
 #include "sdk/share.h"
 #include "services/fileindexd/share_worker.h"

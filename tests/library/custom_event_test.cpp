@@ -1,4 +1,4 @@
-#include "fileindex/custom_event.h"
+#include "fileindex/queue/custom_event.h"
 
 #include <sys/resource.h>
 
@@ -7,7 +7,7 @@
 #include <random>
 
 #include "common/lock_file.h"
-#include "fileindex/optree.h"
+#include "fileindex/optree/optree.h"
 #include "fileindex/status_mgr.h"
 #include "fileindex/util.h"
 #include "sdk/share.h"

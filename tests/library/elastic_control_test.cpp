@@ -4,9 +4,9 @@
 #include <set>
 #include <stdexcept>
 
-#include "fileindex/elastic/fields.h"
 #include "fileindex/status_mgr.h"
 #include "tests/support/library_test.h"
+#include "wire/fields.h"
 
 namespace ferrox::fileindex::elastic {
 

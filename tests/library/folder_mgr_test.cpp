@@ -1,4 +1,4 @@
-#include "fileindex/folder_mgr.h"
+#include "fileindex/folders/folder_mgr.h"
 
 #include <fcntl.h>
 #include <signal.h>

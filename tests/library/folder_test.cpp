@@ -1,11 +1,11 @@
-#include "fileindex/folder.h"
+#include "fileindex/folders/folder.h"
 
 #include <array>
 #include <random>
 
 #include "common/new_class.h"
-#include "fileindex/folder_mgr.h"
-#include "fileindex/folder_status.h"
+#include "fileindex/folders/folder_mgr.h"
+#include "fileindex/folders/folder_status.h"
 #include "fileindex/status_mgr.h"
 #include "fileindex/util.h"
 #include "sdk/share.h"

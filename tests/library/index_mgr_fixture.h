@@ -5,9 +5,9 @@
 #include <map>
 #include <memory>
 
-#include "fileindex/folder_mgr.h"
-#include "fileindex/index_mgr.h"
-#include "fileindex/optree.h"
+#include "fileindex/folders/folder_mgr.h"
+#include "fileindex/operations/index_mgr.h"
+#include "fileindex/optree/optree.h"
 #include "sdk/share.h"
 #include "tests/support/library_test.h"
 #include "tests/support/unix_server.h"

@@ -12,7 +12,7 @@
 #include <string>
 #include <vector>
 
-#include "common/unique_fd.h"
+#include "base/unique_fd.h"
 #include "services/kovanotifyd/cookie.h"
 #include "services/kovanotifyd/watcher.h"
 
@@ -110,9 +110,9 @@ class FakeWatcher : public Watcher {
     return said;
   }
 
-  UniqueFd epoll_{epoll_create1(EPOLL_CLOEXEC)};
-  UniqueFd wake_{eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK)};
-  UniqueFd cookie_{inotify_init1(IN_CLOEXEC | IN_NONBLOCK)};
+  base::UniqueFd epoll_{epoll_create1(EPOLL_CLOEXEC)};
+  base::UniqueFd wake_{eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK)};
+  base::UniqueFd cookie_{inotify_init1(IN_CLOEXEC | IN_NONBLOCK)};
   mutable std::mutex mutex_;
   std::deque<Action> said_;
   std::string refusal_;

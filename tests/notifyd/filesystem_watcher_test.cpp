@@ -24,7 +24,7 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
-#include "common/scope_exit.h"
+#include "base/scope_exit.h"
 #include "tests/support/temp_dir.h"
 
 namespace ferrox::notifyd {

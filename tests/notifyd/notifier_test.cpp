@@ -7,7 +7,7 @@
 #include <gtest/gtest.h>
 
 #include "common/error.h"
-#include "fileindex/optree.h"
+#include "fileindex/optree/optree.h"
 #include "services/kovanotifyd/commands.h"
 #include "tests/notifyd/fake_watcher.h"
 #include "tests/support/log_capture.h"
@@ -106,7 +106,7 @@ class NotifierTest : public testing::Test {
   std::mutex mutex_;
   Registry registry_;
   FakeWatcher* fake_ = nullptr;
-  UniqueFd stop_{eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK)};
+  base::UniqueFd stop_{eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK)};
   std::unique_ptr<Notifier> notifier_;
   std::thread thread_;
 };

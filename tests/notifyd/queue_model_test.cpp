@@ -7,8 +7,8 @@
 
 #include <gtest/gtest.h>
 
-#include "fileindex/optree.h"
-#include "fileindex/queue_mgr.h"
+#include "fileindex/optree/optree.h"
+#include "fileindex/queue/queue_mgr.h"
 #include "services/kovanotifyd/queues/folder_cover.h"
 #include "services/kovanotifyd/queues/queue_router.h"
 #include "tests/support/temp_dir.h"

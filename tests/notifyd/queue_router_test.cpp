@@ -10,7 +10,7 @@
 #include <gtest/gtest.h>
 
 #include "common/lock_file.h"
-#include "fileindex/optree.h"
+#include "fileindex/optree/optree.h"
 #include "tests/support/log_capture.h"
 #include "tests/support/temp_dir.h"
 

@@ -1,5 +1,5 @@
 
-#include "fileindex/queue_mgr.h"
+#include "fileindex/queue/queue_mgr.h"
 
 #include <unistd.h>
 

@@ -17,8 +17,8 @@ namespace {
 
 /// A new socket on which `use`, bind or connect, was called with the path.
 template <typename Use>
-UniqueFd Socket(const std::string& path, const Use& use) {
-  UniqueFd fd(socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0));
+base::UniqueFd Socket(const std::string& path, const Use& use) {
+  base::UniqueFd fd(socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0));
   sockaddr_un address = {};
   address.sun_family = AF_UNIX;
   (void)path.copy(address.sun_path, sizeof(address.sun_path) - 1);
@@ -52,7 +52,7 @@ class Client {
   }
 
  private:
-  UniqueFd fd_;
+  base::UniqueFd fd_;
 };
 
 /// A server that answers with the request reversed, fails on "fail", and runs while the fixture lives.

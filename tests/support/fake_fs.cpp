@@ -4,8 +4,8 @@
 
 #include <kova/fs.h>
 
-#include "platform/base/failure.h"
-#include "platform/base/path_match.h"
+#include "platform/shared/failure.h"
+#include "platform/shared/path_match.h"
 #include "tests/support/fake_platform.h"
 
 using ferrox::test::FakeCallFails;

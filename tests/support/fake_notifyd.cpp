@@ -1,7 +1,7 @@
 #include <kova/notifyd.h>
 
-#include "platform/base/failure.h"
-#include "platform/base/monitor_document.h"
+#include "platform/shared/failure.h"
+#include "platform/shared/monitor_document.h"
 #include "tests/support/fake_platform.h"
 
 using ferrox::test::FakeCallFails;

@@ -6,7 +6,7 @@
 #include <atomic>
 #include <mutex>
 
-#include "platform/base/failure.h"
+#include "platform/shared/failure.h"
 
 namespace ferrox::test {
 

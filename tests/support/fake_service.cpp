@@ -6,8 +6,8 @@
 #include <kova/samba.h>
 #include <kova/service.h>
 
-#include "platform/base/arguments.h"
-#include "platform/base/failure.h"
+#include "platform/shared/arguments.h"
+#include "platform/shared/failure.h"
 #include "tests/support/fake_platform.h"
 
 using ferrox::test::FakeCallFails;

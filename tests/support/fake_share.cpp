@@ -4,10 +4,10 @@
 #include <kova/recycle.h>
 #include <kova/share.h>
 
-#include "platform/base/failure.h"
-#include "platform/base/index_paths.h"
-#include "platform/base/path_match.h"
-#include "platform/base/records.h"
+#include "platform/shared/failure.h"
+#include "platform/shared/index_paths.h"
+#include "platform/shared/path_match.h"
+#include "platform/shared/records.h"
 #include "tests/support/fake_platform.h"
 
 using ferrox::test::FakeCallFails;

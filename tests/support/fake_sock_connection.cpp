@@ -2,8 +2,8 @@
 
 #include <kova/sock_connection.h>
 
-#include "platform/base/failure.h"
-#include "platform/base/frames.h"
+#include "platform/shared/failure.h"
+#include "platform/shared/frames.h"
 #include "tests/support/fake_platform.h"
 
 using ferrox::test::FakeCallFails;

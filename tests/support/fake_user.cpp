@@ -1,7 +1,7 @@
 #include <kova/user.h>
 
-#include "platform/base/failure.h"
-#include "platform/base/records.h"
+#include "platform/shared/failure.h"
+#include "platform/shared/records.h"
 #include "tests/support/fake_platform.h"
 
 using ferrox::test::FakeCallFails;

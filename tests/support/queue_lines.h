@@ -6,7 +6,7 @@
 #include <json/value.h>
 
 #include "common/json_util.h"
-#include "fileindex/optree.h"
+#include "fileindex/optree/optree.h"
 #include "tests/support/temp_dir.h"
 
 /// Queue lines as their writers write them.

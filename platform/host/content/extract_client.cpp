@@ -22,10 +22,10 @@
 #include <kova/instance.h>
 #include <kova/service.h>
 
-#include "platform/base/frames.h"
 #include "platform/host/child_service.h"
 #include "platform/host/files.h"
 #include "platform/host/share_table.h"
+#include "platform/shared/frames.h"
 
 namespace kova::content {
 

@@ -7,7 +7,7 @@
 #include <cstring>
 #include <stdexcept>
 
-#include "platform/base/stamp.h"
+#include "platform/shared/stamp.h"
 
 namespace kova::content {
 

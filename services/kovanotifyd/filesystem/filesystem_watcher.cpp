@@ -9,9 +9,9 @@
 #include <cstring>
 #include <utility>
 
+#include "base/scope_exit.h"
 #include "common/file_util.h"
 #include "common/log.h"
-#include "common/scope_exit.h"
 
 namespace ferrox::notifyd {
 
@@ -31,7 +31,7 @@ constexpr int kRoundsMax = 16;
 constexpr size_t kBurst = 4096;
 
 HandleKey KeyOfPath(FanGroup& group, const std::string& path) {
-  const UniqueFd folder(open(path.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
+  const base::UniqueFd folder(open(path.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
   return folder.Valid() ? group.KeyOf(folder.Get()) : HandleKey();
 }
 
@@ -67,7 +67,7 @@ void FilesystemWatcher::Remove(const std::string& root) {
 
 bool FilesystemWatcher::Advance(std::chrono::milliseconds at_most, WatchListener& listener) {
   const auto until = std::chrono::steady_clock::now() + at_most;
-  const ScopeExit close([this] { mounts_.Close(); });
+  const base::ScopeExit close([this] { mounts_.Close(); });
   while (!to_add_.empty()) {
     const std::string root = to_add_.begin()->first;
     to_add_.erase(to_add_.begin());
@@ -88,7 +88,7 @@ bool FilesystemWatcher::Advance(std::chrono::milliseconds at_most, WatchListener
 std::string FilesystemWatcher::Begin(const std::string& root) {
   std::string reason = OpenGroup();
   if (!reason.empty()) return reason;
-  const UniqueFd folder(open(root.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
+  const base::UniqueFd folder(open(root.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
   if (!folder.Valid()) return "it cannot be opened: " + ErrnoText();
   const HandleKey key = group_.KeyOf(folder.Get());
   if (key.empty()) return FanGroup::Reason(EOPNOTSUPP, FanGroup::Scope::kFileSystem);
@@ -131,7 +131,7 @@ std::string FilesystemWatcher::MarkFileSystem(const std::string& root, int folde
 /// Takes the mark away, and forgets the mounts, when no root needs them any more.
 void FilesystemWatcher::ReleaseFileSystem(const HandleKey& key) {
   if (!roots_.PathsOn(key).empty()) return;
-  const UniqueFd folder = mounts_.Open(key, O_RDONLY | O_DIRECTORY);
+  const base::UniqueFd folder = mounts_.Open(key, O_RDONLY | O_DIRECTORY);
   if (folder.Valid()) (void)group_.Unmark(folder.Get(), FanGroup::Scope::kFileSystem, kMask);
   mounts_.Close();
   mounts_.Remove(key);
@@ -170,7 +170,7 @@ bool FilesystemWatcher::ReadBatch() {
 }
 
 bool FilesystemWatcher::Read(WatchListener& listener) {
-  const ScopeExit close([this] { mounts_.Close(); });
+  const base::ScopeExit close([this] { mounts_.Close(); });
   const bool was_anything = ReadBatch();
   if (!was_anything) Rest();
   for (int round = 0; !window_.IsEmpty(); ++round) {
@@ -334,7 +334,7 @@ void FilesystemWatcher::Disturb(const FanRecord& record, WatchListener& listener
 /// What the daemons write should not even wake this one: the kernel is told to keep it, as long as it remembers.
 void FilesystemWatcher::Silence(const FanRecord& record) {
   if (!can_ignore_) return;
-  const UniqueFd folder = mounts_.Open(record.folder, O_RDONLY | O_DIRECTORY);
+  const base::UniqueFd folder = mounts_.Open(record.folder, O_RDONLY | O_DIRECTORY);
   if (folder.Valid()) can_ignore_ = group_.Ignore(folder.Get(), kQuietMask) != EINVAL;
 }
 

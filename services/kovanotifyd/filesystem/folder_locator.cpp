@@ -1,6 +1,6 @@
 #include "services/kovanotifyd/filesystem/folder_locator.h"
 
-#include "common/scope_exit.h"
+#include "base/scope_exit.h"
 
 namespace ferrox::notifyd {
 
@@ -19,7 +19,7 @@ FolderCache::Folder* FolderLocator::Locate(const HandleKey& key) {
 FolderCache::Folder* FolderLocator::LocateAnew(const HandleKey& key) {
   if (depth_ >= kDepthMax) return nullptr;
   ++depth_;
-  const ScopeExit leave([this] { --depth_; });
+  const base::ScopeExit leave([this] { --depth_; });
   FolderPlace place;
   switch (PlaceOf(key, place)) {
     case FolderSource::Answer::kPlace:

@@ -28,7 +28,7 @@ std::optional<uint64_t> LinkedFiles::NumberToTell(const FanRecord& record) {
 }
 
 std::optional<uint64_t> LinkedFiles::LookAt(const FanRecord& record) {
-  const UniqueFd file = mounts_.Open(record.target, O_PATH | O_NOFOLLOW);
+  const base::UniqueFd file = mounts_.Open(record.target, O_PATH | O_NOFOLLOW);
   struct stat status = {};
   if (!file.Valid() && (errno == ESTALE || errno == ENOENT)) return 0;
   if (!file.Valid() || fstat(file.Get(), &status) != 0) return {};

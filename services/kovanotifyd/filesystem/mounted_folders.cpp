@@ -62,9 +62,9 @@ std::string NameOf(int folder) {
   return std::string(text.substr(text.rfind('/') + 1));
 }
 
-UniqueFd OpenAbove(int folder) {
-  UniqueFd above(openat(folder, "..", kOpenFolder | O_NOATIME));
-  return above.Valid() || errno != EPERM ? std::move(above) : UniqueFd(openat(folder, "..", kOpenFolder));
+base::UniqueFd OpenAbove(int folder) {
+  base::UniqueFd above(openat(folder, "..", kOpenFolder | O_NOATIME));
+  return above.Valid() || errno != EPERM ? std::move(above) : base::UniqueFd(openat(folder, "..", kOpenFolder));
 }
 
 /// Returns when whoever was just changing names in the folder has done so and the kernel has queued the records: both
@@ -85,7 +85,7 @@ std::string MountedFolders::Add(const std::string& path, int folder, const Handl
   if (!IsOpen(*anchor)) return "its mount cannot be opened";
   struct stat there = {};
   struct stat reached = {};
-  const UniqueFd again = FanGroup::OpenKey(key, anchor->fd.Get(), O_PATH | O_DIRECTORY);
+  const base::UniqueFd again = FanGroup::OpenKey(key, anchor->fd.Get(), O_PATH | O_DIRECTORY);
   if (!again.Valid() && errno == EPERM) return "opening folders by handle needs the capability CAP_DAC_READ_SEARCH";
   if (!again.Valid()) return "the file system does not open folders by handle: " + std::string(strerror(errno));
   if (fstat(folder, &there) != 0 || fstat(again.Get(), &reached) != 0 || there.st_dev != reached.st_dev ||
@@ -108,19 +108,19 @@ void MountedFolders::Close() {
 /// Something else may be mounted at the path, or nothing any more.
 bool MountedFolders::IsOpen(Anchor& anchor) {
   if (anchor.fd.Valid()) return true;
-  UniqueFd fd(open(anchor.path.c_str(), kOpenFolder));
+  base::UniqueFd fd(open(anchor.path.c_str(), kOpenFolder));
   if (!fd.Valid() || !FanGroup::IsSameFileSystem(group_.KeyOf(fd.Get()), anchor.key)) return false;
   anchor.fd = std::move(fd);
   return true;
 }
 
-UniqueFd MountedFolders::Open(const HandleKey& folder, int flags) {
+base::UniqueFd MountedFolders::Open(const HandleKey& folder, int flags) {
   errno = ENOENT;
   for (Anchor& anchor : anchors_) {
     if (!FanGroup::IsSameFileSystem(anchor.key, folder) || !IsOpen(anchor)) continue;
     return FanGroup::OpenKey(folder, anchor.fd.Get(), flags);
   }
-  return UniqueFd();
+  return base::UniqueFd();
 }
 
 /// Of what one mount does not show, or shows as its top, another may show what is above.
@@ -141,10 +141,10 @@ FolderSource::Answer MountedFolders::ReadPlaceBy(int mount, const HandleKey& fol
     return is_gone ? FolderSource::Answer::kNowhere : FolderSource::Answer::kFailed;
   };
   Standing standing;
-  const UniqueFd fd = FanGroup::OpenKey(folder, mount, O_PATH | O_DIRECTORY);
+  const base::UniqueFd fd = FanGroup::OpenKey(folder, mount, O_PATH | O_DIRECTORY);
   if (!fd.Valid() || !ReadStanding(fd.Get(), standing)) return failure();
   if (standing.is_top) return FolderSource::Answer::kTop;
-  const UniqueFd above = OpenAbove(fd.Get());
+  const base::UniqueFd above = OpenAbove(fd.Get());
   if (!above.Valid()) return failure();
   place.parent = group_.KeyOf(above.Get(), folder);
   place.name = NameOf(fd.Get());
@@ -157,14 +157,14 @@ FolderSource::Answer MountedFolders::ReadPlaceBy(int mount, const HandleKey& fol
 }
 
 uint64_t MountedFolders::NumberOf(const HandleKey& folder, std::string_view name) {
-  const UniqueFd fd = Open(folder, O_PATH | O_DIRECTORY);
+  const base::UniqueFd fd = Open(folder, O_PATH | O_DIRECTORY);
   struct stat found = {};
   const bool is_there = fd.Valid() && fstatat(fd.Get(), std::string(name).c_str(), &found, AT_SYMLINK_NOFOLLOW) == 0;
   return is_there ? found.st_ino : 0;
 }
 
 std::optional<bool> MountedFolders::HasName(const HandleKey& folder, std::string_view name) {
-  const UniqueFd fd = Open(folder, O_PATH | O_DIRECTORY);
+  const base::UniqueFd fd = Open(folder, O_PATH | O_DIRECTORY);
   if (!fd.Valid()) return {};
   struct stat found = {};
   return fstatat(fd.Get(), std::string(name).c_str(), &found, AT_SYMLINK_NOFOLLOW) == 0;

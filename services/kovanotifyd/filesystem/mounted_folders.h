@@ -7,7 +7,7 @@
 #include <string_view>
 #include <vector>
 
-#include "common/unique_fd.h"
+#include "base/unique_fd.h"
 #include "services/kovanotifyd/fan_group.h"
 #include "services/kovanotifyd/filesystem/folder_locator.h"
 
@@ -33,13 +33,13 @@ class MountedFolders {
   /// The number of what the name in the folder stands for; 0 when there is none.
   uint64_t NumberOf(const HandleKey& folder, std::string_view name);
   /// Opens the folder or file by whichever mount of its file system is there.
-  UniqueFd Open(const HandleKey& folder, int flags);
+  base::UniqueFd Open(const HandleKey& folder, int flags);
 
  private:
   struct Anchor {
     std::string path;
     HandleKey key;
-    UniqueFd fd = {};
+    base::UniqueFd fd = {};
   };
 
   bool IsOpen(Anchor& anchor);

@@ -94,7 +94,7 @@ void FanInodePort::LearnNumbers(int folder, const HandleKey& handle) {
 std::string FanInodePort::Reason(int error) const { return FanGroup::Reason(error, kScope); }
 
 void FanInodePort::Unwatch(FolderKey key, const std::string& path) {
-  const UniqueFd folder(open(path.c_str(), O_PATH | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
+  const base::UniqueFd folder(open(path.c_str(), O_PATH | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
   if (!folder.Valid() || Shorten(group_.KeyOf(folder.Get())) != key)
     return;  // elsewhere by now: its records are dropped
   (void)group_.Unmark(folder.Get(), kScope, kAllMask);

@@ -78,7 +78,7 @@ void FolderWatcher::LookAndReport(Id id, bool always, WatchListener& listener) {
 /// Watches the folder at the place of `id`. Where it is new there, or always, it is listed, and the folders in it are
 /// added to `below`. `id` may be gone afterwards.
 FolderWatcher::Seen FolderWatcher::Look(Id id, bool always, std::vector<Ref>& below, WatchListener& listener) {
-  UniqueFd folder(OpenFolder(tree_.Path(id)));
+  base::UniqueFd folder(OpenFolder(tree_.Path(id)));
   if (!folder.Valid()) return Unwatchable(id, errno, listener);
   if (!IsOnRootsMount(id, folder.Get())) {
     RemoveFolder(id, listener);
@@ -156,7 +156,7 @@ void FolderWatcher::ForgetGone(Id id, WatchListener& listener) {
 }
 
 /// Brings the tree's folders below `id` in line with those in the open folder.
-void FolderWatcher::List(Id id, UniqueFd folder, std::vector<Ref>& below, WatchListener& listener) {
+void FolderWatcher::List(Id id, base::UniqueFd folder, std::vector<Ref>& below, WatchListener& listener) {
   const auto ignored = IgnoredIn(id);
   const std::unique_ptr<DIR, DirClose> dir(fdopendir(folder.Get()));
   if (dir == nullptr) return;

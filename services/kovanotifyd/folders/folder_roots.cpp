@@ -174,7 +174,7 @@ void FolderWatcher::WatchPassages(Id root) {
   for (Id at = root; at != FolderTree::kTop;) {
     at = tree_.Parent(at);
     if (IsCovered(at)) return;
-    const UniqueFd folder(open(tree_.Path(at).c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
+    const base::UniqueFd folder(open(tree_.Path(at).c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
     FolderKey key = 0;
     if (!folder.Valid() || port_->Watch(folder.Get(), FolderPort::Wanted::kPlace, key) != 0) continue;
     if (tree_.ByKey(key) != kNone) continue;

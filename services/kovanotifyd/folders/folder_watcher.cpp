@@ -25,7 +25,7 @@ FolderWatcher::FolderWatcher(std::unique_ptr<FolderPort> port, const Options& op
   watches_max_ = options.watches_max != 0 ? options.watches_max : port_->WatchLimit().watches / 10 * 8;
   if (watches_max_ == 0) watches_max_ = UINT64_MAX;
   if (options.cookie_file.empty()) return;
-  const UniqueFd folder(open(Dirname(options.cookie_file).c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+  const base::UniqueFd folder(open(Dirname(options.cookie_file).c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
   const int error = folder.Valid() ? port_->Watch(folder.Get(), FolderPort::Wanted::kCookie, cookie_folder_) : errno;
   if (error != 0) Log(LOG_WARNING, "%s cannot be watched: %s", options.cookie_file.c_str(), strerror(error));
 }

@@ -10,7 +10,7 @@
 #include <utility>
 #include <vector>
 
-#include "common/unique_fd.h"
+#include "base/unique_fd.h"
 #include "services/kovanotifyd/folders/folder_port.h"
 #include "services/kovanotifyd/folders/folder_tree.h"
 #include "services/kovanotifyd/watcher.h"
@@ -100,7 +100,7 @@ class FolderWatcher : public Watcher {
   bool Claim(Id id, int folder, FolderKey key, WatchListener& listener);
   Seen Unwatchable(Id id, int error, WatchListener& listener);
   void ForgetGone(Id id, WatchListener& listener);
-  void List(Id id, UniqueFd folder, std::vector<Ref>& below, WatchListener& listener);
+  void List(Id id, base::UniqueFd folder, std::vector<Ref>& below, WatchListener& listener);
   bool IsOnRootsMount(Id id, int folder);
   void CheckPlace(const Place& place, WatchListener& listener);
 

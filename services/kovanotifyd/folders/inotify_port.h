@@ -4,7 +4,7 @@
 #include <string>
 #include <vector>
 
-#include "common/unique_fd.h"
+#include "base/unique_fd.h"
 #include "services/kovanotifyd/folders/folder_port.h"
 
 namespace ferrox::notifyd {
@@ -27,7 +27,7 @@ class InotifyPort : public FolderPort {
  private:
   bool Fill();
 
-  UniqueFd inotify_;
+  base::UniqueFd inotify_;
   std::unique_ptr<char[]> buffer_;
   size_t filled_ = 0;
 };

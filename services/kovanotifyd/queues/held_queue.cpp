@@ -14,7 +14,7 @@
 #include "common/line_file.h"
 #include "common/lock_file.h"
 #include "common/log.h"
-#include "fileindex/optree.h"
+#include "fileindex/optree/optree.h"
 #include "services/kovanotifyd/queues/queue_line.h"
 
 namespace ferrox::notifyd {

@@ -3,7 +3,7 @@
 #include <algorithm>
 #include <utility>
 
-#include "fileindex/optree.h"
+#include "fileindex/optree/optree.h"
 #include "services/kovanotifyd/queues/folder_cover.h"
 #include "services/kovanotifyd/queues/queue_line.h"
 
@@ -119,7 +119,7 @@ void QueueOutbox::CloseAll() {
 void QueueOutbox::Tidy() {
   if (!std::exchange(may_cover_, false) || whole_ == 0) return;
   std::vector<Line> kept;
-  fileindex::PathTable<size_t> open;
+  base::PathTable<size_t> open;
   size_t whole = whole_;
   for (size_t i = 0; i < lines_.size(); ++i) {
     Line& line = lines_[i];

@@ -6,7 +6,7 @@
 #include <string_view>
 #include <vector>
 
-#include "fileindex/path_table.h"
+#include "base/path_table.h"
 
 namespace ferrox::notifyd {
 
@@ -67,9 +67,9 @@ class QueueOutbox {
   void TakeFolders();
 
   std::vector<Line> lines_;
-  fileindex::PathTable<size_t> open_;  // by path, the place of its open line in lines_
-  size_t whole_ = 0;                   // open lines that stand for all below their path
-  bool may_cover_ = false;             // one of them came behind lines that it may stand for
+  base::PathTable<size_t> open_;  // by path, the place of its open line in lines_
+  size_t whole_ = 0;              // open lines that stand for all below their path
+  bool may_cover_ = false;        // one of them came behind lines that it may stand for
   size_t max_;
   size_t limit_;  // so many lines are too many; more than max_ only where even the watched folders are
 };

@@ -6,7 +6,7 @@
 #include <string_view>
 #include <utility>
 
-#include "fileindex/optree.h"
+#include "fileindex/optree/optree.h"
 #include "services/kovanotifyd/queues/held_queue.h"
 #include "services/kovanotifyd/queues/open_files.h"
 #include "services/kovanotifyd/queues/watch_rules.h"

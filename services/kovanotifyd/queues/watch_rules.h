@@ -7,7 +7,7 @@
 #include <string_view>
 #include <vector>
 
-#include "fileindex/path_table.h"
+#include "base/path_table.h"
 #include "services/kovanotifyd/queues/queue_router.h"
 
 namespace ferrox::notifyd {
@@ -52,7 +52,7 @@ class WatchRules {
   const std::vector<Match>& Collect(std::string_view path, std::vector<Match>& matches);
   static void Add(size_t queue, const QueueWatch& watch, std::map<std::string, std::vector<Rule>>& rules);
 
-  fileindex::PathTable<std::vector<Rule>> rules_;  // by the watched folder; "" is the file system's root
+  base::PathTable<std::vector<Rule>> rules_;  // by the watched folder; "" is the file system's root
   std::map<std::string, std::vector<size_t>> by_path_;
   std::vector<uint64_t> seen_;  // by queue: the look-up that met it last
   uint64_t lookup_ = 0;

@@ -5,9 +5,9 @@
 
 #include <cerrno>
 
+#include "base/unique_fd.h"
 #include "common/file_util.h"
 #include "common/log.h"
-#include "common/unique_fd.h"
 
 #ifndef STATX_MNT_ID
 #define STATX_MNT_ID 0x1000U
@@ -43,7 +43,7 @@ FolderLook LookAtFolder(const std::string& path) {
   if (statx(AT_FDCWD, path.c_str(), kLookFlags, STATX_BASIC_STATS | STATX_BTIME, &info) != 0) return FailureByErrno();
   if (S_ISLNK(info.stx_mode)) return Failure(FolderLook::Result::kGone, "is a symbolic link");
   if (!S_ISDIR(info.stx_mode)) return Failure(FolderLook::Result::kGone, "is no folder");
-  const UniqueFd opened(open(path.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
+  const base::UniqueFd opened(open(path.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
   if (!opened.Valid()) return FailureByErrno();
   if (RealPath(path) != path) return Failure(FolderLook::Result::kGone, "is reached through a symbolic link");
   FolderLook look = {FolderLook::Result::kUsable};

@@ -7,7 +7,7 @@
 #include <utility>
 #include <vector>
 
-#include "common/unique_fd.h"
+#include "base/unique_fd.h"
 
 namespace ferrox::notifyd {
 
@@ -50,7 +50,7 @@ class MountTable {
   void NoteMissing(const Lines& lines, const Lines& others);
 
   std::string path_;
-  UniqueFd fd_;
+  base::UniqueFd fd_;
   Lines lines_;
   std::set<std::string> changed_;
 };

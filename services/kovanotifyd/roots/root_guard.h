@@ -4,7 +4,7 @@
 #include <set>
 #include <string>
 
-#include "common/unique_fd.h"
+#include "base/unique_fd.h"
 
 namespace ferrox::notifyd {
 
@@ -22,7 +22,7 @@ class RootGuard {
   std::set<std::string> Read();
 
  private:
-  UniqueFd inotify_;
+  base::UniqueFd inotify_;
   std::map<int, std::set<std::string>> paths_;  ///< by watch: a folder that is mounted twice has one
 };
 

@@ -1,0 +1,116 @@
+#define FERROX_SOURCE "util"
+
+#include "fileindex/queue/custom_event.h"
+
+#include <syslog.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <functional>
+#include <optional>
+
+#include <json/value.h>
+
+#include "base/path_table.h"
+#include "common/json_util.h"
+#include "common/line_file.h"
+#include "common/lock_file.h"
+#include "common/log.h"
+#include "common/new_class.h"
+#include "fileindex/optree/optree.h"
+#include "fileindex/queue/queue_mgr.h"
+#include "fileindex/status_mgr.h"
+#include "fileindex/util.h"
+#include "sdk/share.h"
+
+namespace ferrox::fileindex {
+
+namespace {
+
+std::string EventLine(int event, const std::string& path, const std::string& path_old, const Json::Value& data) {
+  Json::Value line(Json::objectValue);
+  line["event"] = event;
+  line["path"] = path;
+  line["path_old"] = path_old;
+  line["data"] = data;
+  return toString(line) + "\n";
+}
+
+/// Says, given a queue, whether a reindex that waits in it will see whatever the event would tell.
+using IsCovered = std::function<bool(const std::string& queue_path)>;
+
+void QueueEvent(const std::string& queue_path, const std::string& path, const std::string& line,
+                const IsCovered& is_covered) {
+  if (is_covered(queue_path)) return;
+  FERROX_FAIL_IF(line.size() - 1 > kQueueLineMaxBytes, Error::kInternal, "Event too long for a queue, path=" + path);
+  const LockFile lock(queue_path, true);
+  FERROX_FAIL_IF(!AppendLines(queue_path, line), Error::kInternal, "Failed to write queue, reason=" + ErrnoText());
+}
+
+/// Queues the event; when that fails, the share is marked instead.
+void QueueOrMark(const std::string& path, const std::string& line, const IsCovered& is_covered) {
+  std::string share_name;
+  std::string share_path;
+  try {
+    GetShareNamePathByFullPath(share_name, share_path, path);
+    QueueEvent(sdk::SDKShare(share_name).GetQueuePath(), path, line, is_covered);
+  } catch (const Error& error) {
+    Log(LOG_ERR, "%s:%d (%d, %u) (%s) AddCustomEvent failed, code=%d, reason=%s. Set [%s] need reindex%s",
+        ModuleName(FERROX_SOURCE).c_str(), __LINE__, getpid(), geteuid(), "AddCustomEvent",
+        static_cast<int>(error.Code()), error.what(), share_name.c_str(), ErrnoSuffix().c_str());
+    errno = 0;
+    newClass<StatusMgr>()->SetShareStatus(share_name, StatusMgr::kNeedReindex);
+    throw Error(error);
+  }
+}
+
+}  // namespace
+
+/// The reindexes that a share's queues held when this was made, and those of the writer since.
+class QueuedReindexes {
+ public:
+  explicit QueuedReindexes(const std::string& queue_path) {
+    try {
+      (void)QueueMgr(queue_path).FindQueues([this](const std::shared_ptr<Event>& event) {
+        if (event->event == EVENT_REINDEX) Add(event->path);
+        return false;
+      });
+    } catch (const Error& error) {
+      failure_ = error;
+    }
+  }
+
+  void Add(const std::string& path) { paths_.Insert(path, true); }
+
+  /// QueueMgr::IsFullPathHasReindex: what stands before a bad line is found, then the bad line fails.
+  bool Cover(const std::string& full_path) const {
+    const bool is_covered = paths_.HasAtOrAbove(full_path);
+    if (!is_covered && failure_) throw Error(*failure_);
+    return is_covered;
+  }
+
+ private:
+  base::PathTable<bool> paths_;
+  std::optional<Error> failure_;
+};
+
+void AddCustomEvent(int event, const std::string& path, const std::string& path_old, const Json::Value& data) {
+  QueueOrMark(path, EventLine(event, path, path_old, data),
+              [&path](const std::string& queue_path) { return QueueMgr(queue_path).IsFullPathHasReindex(path); });
+}
+
+CustomEventWriter::CustomEventWriter() = default;
+CustomEventWriter::~CustomEventWriter() = default;
+
+void CustomEventWriter::Add(int event, const std::string& path, const std::string& path_old, const Json::Value& data) {
+  QueuedReindexes* queued = nullptr;
+  QueueOrMark(path, EventLine(event, path, path_old, data), [&](const std::string& queue_path) {
+    std::unique_ptr<QueuedReindexes>& known = queues_[queue_path];
+    if (known == nullptr) known = std::make_unique<QueuedReindexes>(queue_path);
+    queued = known.get();
+    return queued->Cover(path);
+  });
+  if (event == EVENT_REINDEX) queued->Add(path);
+}
+
+}  // namespace ferrox::fileindex

@@ -1,0 +1,82 @@
+#include "fileindex/queue/queue_mgr.h"
+
+#include <cerrno>
+#include <cstdio>
+
+#include "common/file_util.h"
+#include "common/lock_file.h"
+#include "common/log.h"
+#include "common/new_class.h"
+#include "fileindex/folders/folder_mgr.h"
+#include "fileindex/optree/op_path.h"
+#include "fileindex/optree/optree.h"
+#include "fileindex/queue/event_line_reader.h"
+
+namespace ferrox::fileindex {
+
+QueueMgr::QueueMgr(const std::string& queue_path) : queue_path_(queue_path), queue_path_tmp_(queue_path + ".tmp") {}
+
+void QueueMgr::DeleteTmp() {
+  (void)Unlink(queue_path_tmp_);
+  op_tree_tmp_.reset();
+}
+
+bool QueueMgr::PrepareTmpQueue() {
+  if (!IsFileExist(queue_path_)) return IsFileExist(queue_path_tmp_);
+  const LockFile lock(queue_path_, true);
+  if (IsFileExist(queue_path_tmp_)) return true;
+  FERROX_FAIL_IF(0 > rename(queue_path_.c_str(), queue_path_tmp_.c_str()), Error::kInternal,
+                 "rename failed, reason=" + ErrnoText());
+  op_tree_tmp_.reset();
+  return true;
+}
+
+std::shared_ptr<OPTree> QueueMgr::GetOPTree() const {
+  if (op_tree_ == nullptr) op_tree_ = newClass<OPTree>(queue_path_);
+  return op_tree_;
+}
+
+std::shared_ptr<OPTree> QueueMgr::GetOPTreeTmp() const {
+  if (op_tree_tmp_ == nullptr) op_tree_tmp_ = newClass<OPTree>(queue_path_tmp_);
+  return op_tree_tmp_;
+}
+
+int QueueMgr::ProcessOP(const std::function<void(std::shared_ptr<OP>)>& fn, bool use_tmp) {
+  if (use_tmp) return PrepareTmpQueue() ? GetOPTreeTmp()->ProcessOP(fn) : 0;
+  return IsFileExist(queue_path_) ? GetOPTree()->ProcessOP(fn) : 0;
+}
+
+bool QueueMgr::IsFullPathProcessing(const std::string& full_path) {
+  // Folders that cannot be loaded count as a failure here; otherwise they have no say.
+  const FolderMgr folder_mgr;
+  const auto touches = [&full_path](const std::shared_ptr<Event>& event) {
+    return IsAtOrBelow(event->path, full_path) || IsAtOrBelow(event->path_old, full_path);
+  };
+  return FindQueues(touches);
+}
+
+bool QueueMgr::IsFullPathHasReindex(const std::string& full_path) {
+  const auto covers = [&full_path](const std::shared_ptr<Event>& event) {
+    return event->event == EVENT_REINDEX && IsAtOrBelow(full_path, event->path);
+  };
+  return FindQueues(covers);
+}
+
+bool QueueMgr::FindQueues(const std::function<bool(std::shared_ptr<Event>)>& pred) const {
+  return FindQueue(pred, queue_path_) || FindQueue(pred, queue_path_tmp_);
+}
+
+bool QueueMgr::FindQueue(const std::function<bool(std::shared_ptr<Event>)>& pred, const std::string& path) {
+  if (!IsFileExist(path)) return false;
+  EventLineReader reader(path);
+  // Detached or deleted since: as missing as before.
+  if (!reader.Valid() && errno == ENOENT) return false;
+  FERROX_FAIL_IF_AS(!reader.Valid(), "!input_stream", Error::kInternal, "Failed to open queue, reason=" + ErrnoText());
+  std::string_view line;
+  while (reader.Next(line)) {
+    if (pred(newClass<Event>(std::string(line)))) return true;
+  }
+  return false;
+}
+
+}  // namespace ferrox::fileindex

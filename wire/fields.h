@@ -1,0 +1,57 @@
+#pragma once
+
+/// The names of the document fields that content extraction fills and the search engine stores, one constant each: the
+/// field "KOVAMDPath" is kKOVAMDPath, "_KOVAMDUserTags" is k_KOVAMDUserTags. Stored documents use them: a name never
+/// changes, odd as some are ("KOVAMDContactKeyworlds", "KOVAMDRecodingDate", "KOVAStateOrProvince").
+namespace ferrox::fileindex::elastic {
+
+// clang-format off
+#define FERROX_FIELD_NAMES(X) \
+  X(KOVAMDAttributeChangeDate) X(KOVAMDAudiences) X(KOVAMDAuthors) X(KOVAMDAuthorAddresses) X(KOVAMDCity) \
+  X(KOVAMDComment) X(KOVAMDContactKeyworlds) X(KOVAMDContentCreationDate) X(KOVAMDContentModificationDate) \
+  X(KOVAMDContentType) X(KOVAMDContentTypeTree) X(KOVAMDContributors) X(KOVAMDCopyright) X(KOVAMDCountry) \
+  X(KOVAMDCoverage) X(KOVAMDCreator) X(KOVAMDDescription) X(KOVAMDDisplayName) X(KOVAMDDueDate) \
+  X(KOVAMDDurationSecond) X(KOVAMDEmailAddresses) X(KOVAMDEncodingApplications) X(KOVAMDFinderComment) \
+  X(KOVAMDFonts) X(KOVAMDHeadline) X(KOVAMDIdentifier) X(KOVAMDInstantMessageAddresses) X(KOVAMDInstructions) \
+  X(KOVAMDKeywords) X(KOVAMDKind) X(KOVAMDLanguages) X(KOVAMDLastUsedDate) X(KOVAMDNumberOfPages) \
+  X(KOVAMDNamedLocation) X(KOVAMDOrganizations) X(KOVAMDPageHeight) X(KOVAMDPageWidth) X(KOVAMDParticipants) \
+  X(KOVAMDPhoneNumbers) X(KOVAMDProjects) X(KOVAMDPublishers) X(KOVAMDRecipients) X(KOVAMDRecipientAddresses) \
+  X(KOVAMDRights) X(KOVAMDSecurityMethod) X(KOVAMDStarRating) X(KOVAStateOrProvince) X(KOVAMDTextContent) \
+  X(KOVAMDTitle) X(KOVAMDVersion) X(KOVAMDWhereFroms) X(KOVAMDAcquisitionMake) X(KOVAMDAcquisitionModel) \
+  X(KOVAMDAlbum) X(KOVAMDAperture) X(KOVAMDBitsPerSample) X(KOVAMDColorSpace) X(KOVAMDEXIFVersion) \
+  X(KOVAMDExposureMode) X(KOVAMDExposureProgram) X(KOVAMDExposureTimeSeconds) X(KOVAMDExposureTimeString) \
+  X(KOVAMDFNumber) X(KOVAMDFlashOnOff) X(KOVAMDFocalLength) X(KOVAMDHasAlphaChannel) X(KOVAMDISOSpeed) \
+  X(KOVAMDLayerNames) X(KOVAMDMaxAperture) X(KOVAMDMeteringMode) X(KOVAMDOrientation) X(KOVAMDPixelHeight) \
+  X(KOVAMDPixelWidth) X(KOVAMDPixelCount) X(KOVAMDProfileName) X(KOVAMDRedEyeOnOff) X(KOVAMDResolutionHeightDPI) \
+  X(KOVAMDResolutionWidthDPI) X(KOVAMDWhiteBalance) X(KOVAMDAudioBitRate) X(KOVAMDCodecs) X(KOVAMDDeliveryType) \
+  X(KOVAMDMediaTypes) X(KOVAMDStreamable) X(KOVAMDTotalBitRate) X(KOVAMDVideoBitRate) \
+  X(KOVAMDAppleLoopDescriptors) X(KOVAMDAppleLoopsKeyFilterType) X(KOVAMDAppleLoopsLoopMode) \
+  X(KOVAMDAppleLoopsRootKey) X(KOVAMDAudioChannelCount) X(KOVAMDAudioEncodingApplication) X(KOVAMDAudioSampleRate) \
+  X(KOVAMDAudioTrackNumber) X(KOVAMDComposer) X(KOVAMDGeneralMIDISequence) X(KOVAMDKeySignature) X(KOVAMDLyricist) \
+  X(KOVAMDMusicalGenre) X(KOVAMDMusicalInstrumentCategory) X(KOVAMDMusicalInstrumentName) X(KOVAMDRecodingDate) \
+  X(KOVAMDRecordingYear) X(KOVAMDTempo) X(KOVAMDTimeSignature) X(KOVAMDFSContentChangeDate) \
+  X(KOVAMDFSCreationDate) X(KOVAMDFSInvisible) X(KOVAMDFSIsExtensionHidden) X(KOVAMDFSLabel) X(KOVAMDFSName) \
+  X(KOVAMDFSNodeCount) X(KOVAMDOwnerGroupID) X(KOVAMDOwnerUserID) X(KOVAMDFSSize) X(KOVAMDPath) X(_KOVAMDUserTags) \
+  X(KOVAMDParent) X(KOVAMDSearchFileName) X(KOVAMDExtension) X(KOVAMDPrivilege) X(KOVAMDIsDir) X(KOVAMDWildcard) \
+  X(_KOVAMDFinderLabel) X(_KOVAMDGroupId) X(KOVAMDFinderOpenDate) X(KOVAMDLogicalSize) X(KOVAMDPhysicalSize) \
+  X(KOVAMDDateAdded) X(KOVAMDPeopleDisplayName)
+// clang-format on
+
+#define FERROX_DEFINE_FIELD(name) inline constexpr char k##name[] = #name;
+FERROX_FIELD_NAMES(FERROX_DEFINE_FIELD)
+#undef FERROX_DEFINE_FIELD
+
+#define FERROX_LIST_FIELD(name) k##name,
+inline constexpr const char* kFieldNames[] = {FERROX_FIELD_NAMES(FERROX_LIST_FIELD)};
+#undef FERROX_LIST_FIELD
+
+// The settings of content extraction.
+inline constexpr char kNeedMeta[] = "need_meta";  ///< in the configuration: whether the content is read, too
+inline constexpr char kCfg[] = "cfg";
+inline constexpr char kPath[] = "path";
+inline constexpr char kPseudoPath[] = "pseudo_path";
+inline constexpr char kContentExtractd[] = "kovacontentextractd";
+inline constexpr char kContentExtractdPidPath[] = "/var/run/kovacontentextractd.pid";
+inline constexpr char kContentExtractdShmPath[] = "/tmp/kovace_shm";
+
+}  // namespace ferrox::fileindex::elastic
