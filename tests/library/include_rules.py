@@ -84,4 +84,5 @@ def main(source_folder):
     return 1 if wrong or count < 50 else 0
 
 
-sys.exit(main(sys.argv[1]))
+if __name__ == "__main__":
+    sys.exit(main(sys.argv[1]))
