@@ -4,12 +4,15 @@
 #include <string>
 #include <string_view>
 
+/// The engine's own folding of text: an index word has no case and no accents, so that "Résumé", "RESUME" and "resume"
+/// find each other. Foldings and classes are part of the index format: a change of either makes words of older indices
+/// unfindable (tests/engine/words_test.cpp holds all of them).
 namespace ferrox::engine {
 
-/// What a character means for the splitting of text into words.
+/// What a character means where text is split into words.
 enum class CharClass : uint8_t {
   kSeparator,  ///< ends a word
-  kMark,       ///< an accent on its own: as if it were not there
+  kMark,       ///< an accent on its own, a joiner: skipped
   kLetter,     ///< part of a word
   kPaired,     ///< of a script without blanks between words: indexed in pairs
 };
@@ -21,14 +24,15 @@ struct CodePoint {
   uint32_t length_bytes;
 };
 
-/// Decodes the character at `pos`, which must lie within `text`. A base character and its sound mark or the parts of a
-/// Korean syllable, as some systems write them, are one.
+/// Decodes the character at `pos`, which must lie within `text`. A kana and its separate sound mark, or the two or
+/// three parts of a Korean syllable (both are how macOS writes file names), are decoded as the one composed character.
 CodePoint DecodeAt(std::string_view text, size_t pos);
 
 void AppendUtf8(std::string& out, uint32_t code_point);
 
-/// Appends the folded form of a letter (no case, no accent; up to two letters) or of a paired character to `folded`.
-/// Nothing is appended for the other classes.
+/// Appends the folded form of a letter (no case, no accent; up to two letters, "ss" for a sharp s) or of a paired
+/// character to `folded`. Nothing is appended for the other classes.
+/// @return the character's class.
 CharClass FoldTo(std::string& folded, uint32_t code_point);
 
 /// The whole text with every letter folded and accents removed; what is no letter stays.
