@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <array>
+#include <iterator>
 
 #include "services/kovacontentextractd/readers/encoding.h"
 #include "services/kovacontentextractd/readers/utf8.h"
@@ -15,49 +16,37 @@ constexpr std::array<uint16_t, 32> kWindows1252 = {0x20AC, 0x81,   0x201A, 0x019
                                                    0x90,   0x2018, 0x2019, 0x201C, 0x201D, 0x2022, 0x2013, 0x2014,
                                                    0x02DC, 0x2122, 0x0161, 0x203A, 0x0153, 0x9D,   0x017E, 0x0178};
 
-std::string NameOf(int code_page) {
-  switch (code_page) {
-    case 437:
-    case 850:
-      return "IBM850";
-    case 852:
-      return "IBM852";
-    case 855:
-      return "IBM855";
-    case 866:
-      return "IBM866";
-    case 874:
-      return "WINDOWS-874";
-    case 932:
-      return "CP932";
-    case 936:
-    case 54936:
-      return "GB18030";
-    case 949:
-      return "UHC";
-    case 950:
-      return "BIG5-HKSCS";
-    case 1361:
-      return "JOHAB";
-    case 10000:
-    case 32768:
-      return "MACINTOSH";
-    case 10001:
-      return "CP932";
-    case 10002:
-      return "BIG5-HKSCS";
-    case 10003:
-      return "UHC";
-    case 10008:
-      return "GB18030";
-    case 10007:
-      return "MAC-CYRILLIC";
-    case 20866:
-    case 21866:
-      return "KOI8-U";
-    default:
-      return code_page >= 1250 && code_page <= 1258 ? "WINDOWS-" + std::to_string(code_page) : std::string();
-  }
+/// The code pages of Windows (below 10000), of the Macintosh (10000 and on) and of old versions of Excel (32768), and
+/// the converter used for each. Where one encoding extends another (GB18030 and GBK, KOI8-U and KOI8-R), it is the wider
+/// one.
+struct CodePage {
+  int number;
+  const char* converter;
+};
+constexpr CodePage kCodePages[] = {
+    {437, "IBM850"},       // DOS, United States
+    {850, "IBM850"},       // DOS, Western
+    {852, "IBM852"},       // DOS, Central European
+    {855, "IBM855"},       // DOS, Cyrillic
+    {866, "IBM866"},       // DOS, Russian
+    {874, "WINDOWS-874"},  // Thai
+    {932, "CP932"},        // Japanese
+    {936, "GB18030"},      // Chinese, simplified
+    {949, "UHC"},          // Korean
+    {950, "BIG5-HKSCS"},   // Chinese, traditional
+    {1361, "JOHAB"},       // Korean, by letters
+    {10000, "MACINTOSH"}, {10001, "CP932"},   {10002, "BIG5-HKSCS"}, {10003, "UHC"}, {10007, "MAC-CYRILLIC"},
+    {10008, "GB18030"},   {20866, "KOI8-U"},  // Russian
+    {21866, "KOI8-U"},                        // Ukrainian
+    {32768, "MACINTOSH"}, {54936, "GB18030"},
+};
+
+/// The converter for a code page; "" when there is none.
+std::string ConverterFor(int code_page) {
+  if (code_page >= 1250 && code_page <= 1258) return "WINDOWS-" + std::to_string(code_page);
+  const auto* found = std::find_if(std::begin(kCodePages), std::end(kCodePages),
+                                   [&](const CodePage& page) { return page.number == code_page; });
+  return found == std::end(kCodePages) ? std::string() : found->converter;
 }
 
 }  // namespace
@@ -69,7 +58,7 @@ std::string FromCodePage(std::string_view bytes, int code_page) {
   if (code_page == kUtf16) return FromUtf16Little(bytes);
   const bool ascii = std::none_of(bytes.begin(), bytes.end(), [](char c) { return (c & 0x80) != 0; });
   if (ascii || (code_page == kUtf8 && IsUtf8(bytes, false))) return std::string(bytes);
-  const std::string name = NameOf(code_page);
+  const std::string name = ConverterFor(code_page);
   DecodedText decoded;
   if (!name.empty() && code_page != 1252 && Decode(bytes, true, name, decoded)) return decoded.text;
   std::string out;
