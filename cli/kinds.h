@@ -5,10 +5,12 @@
 
 #include <json/value.h>
 
+#include "fileindex/folders/folder_rule.h"
+
 namespace ferrox::cli {
 
 /// The kinds of files whose content can be indexed, in the order of the configuration.
-inline constexpr std::array<const char*, 4> kKinds = {"document", "audio", "video", "photo"};
+inline constexpr auto& kKinds = fileindex::kContentKindNames;
 
 /// A choice of kinds.
 class Kinds {

@@ -1,6 +1,7 @@
 #include "fileindex/folders/folder.h"
 
 #include "common/json_util.h"
+#include "fileindex/folders/folder_rule.h"
 #include "fileindex/folders/folder_status.h"
 #include "fileindex/queue/queue_mgr.h"
 #include "fileindex/util.h"
@@ -68,12 +69,10 @@ Json::Value Folder::GetData() const {
 }
 
 Json::Value Folder::GetIndexCfg() const {
-  Json::Value kinds(Json::objectValue);
-  kinds["document"] = document_;
-  kinds["audio"] = audio_;
-  kinds["video"] = video_;
-  kinds["photo"] = photo_;
-  return kinds;
+  Json::Value stored(Json::objectValue);
+  const ContentKinds kinds = KindsOf(*this);
+  for (size_t i = 0; i < kinds.size(); ++i) stored[kContentKindNames[i]] = kinds[i];
+  return stored;
 }
 
 bool Folder::IsIndexing() const {

@@ -16,6 +16,7 @@
 #include "common/log.h"
 #include "common/new_class.h"
 #include "common/paths.h"
+#include "fileindex/folders/folder_rule.h"
 #include "fileindex/folders/folder_share.h"
 #include "fileindex/util.h"
 #include "sdk/credentials.h"
@@ -197,12 +198,8 @@ void FolderMgr::List(std::vector<std::shared_ptr<Folder>>& out, unsigned int& to
 }
 
 std::shared_ptr<Folder> FolderMgr::GetMostSuitableCfg(const std::string& full_path) const {
-  std::shared_ptr<Folder> deepest;
-  ByFullPath().by_full_path.VisitUpwards(full_path, [&deepest](const std::shared_ptr<Folder>& folder) {
-    deepest = folder;
-    return true;
-  });
-  return deepest;
+  const std::shared_ptr<Folder>* folder = Governing(ByFullPath().by_full_path, full_path);
+  return folder != nullptr ? *folder : nullptr;
 }
 
 std::shared_ptr<Folder> FolderMgr::DiffCfg(std::shared_ptr<Folder> a, std::shared_ptr<Folder> b) {
@@ -221,20 +218,7 @@ bool FolderMgr::IsFullPathHasOwnCfg(const std::string& full_path) const {
 
 bool FolderMgr::IsFullPathNeedMeta(const std::string& full_path) const {
   const std::shared_ptr<Folder> folder = GetMostSuitableCfg(full_path);
-  if (folder == nullptr) return false;
-  switch (GetFileTypeByFullPath(full_path)) {
-    case FILE_TYPE_DOCUMENT:
-      return folder->IsDocument();
-    case FILE_TYPE_AUDIO:
-      return folder->IsAudio();
-    case FILE_TYPE_VIDEO:
-      return folder->IsVideo();
-    case FILE_TYPE_IMAGE:
-      return folder->IsPhoto();
-    case FILE_TYPE_OTHER:
-      break;
-  }
-  return true;
+  return folder != nullptr && WantsContent(KindsOf(*folder), full_path);
 }
 
 bool FolderMgr::IsShareIndexed(const std::string& share) const {

@@ -9,14 +9,14 @@
 #include "common/file_util.h"
 #include "common/json_util.h"
 #include "fileindex/folders/folder_mgr.h"
-#include "fileindex/util.h"
 #include "sdk/share.h"
 
 namespace ferrox::indexd {
 
 namespace {
 
-constexpr std::array<const char*, 4> kKindNames = {"document", "audio", "video", "photo"};
+using fileindex::kContentKindNames;
+
 constexpr char kInner[] = "inner";
 
 /// The indexed shares below a folder: their names, by their own folders.
@@ -39,14 +39,15 @@ ShareFolders ShareFolders::FromJson(const Json::Value& stored) {
   if (!IsJsonObject(stored)) throw Error(Error::kBadArgument, "not an object");
   const Json::Value& inner = stored[kInner];
   for (Json::ArrayIndex i = 0; inner.isArray() && i < inner.size(); ++i) {
-    if (inner[i].isString()) folders.inner_[inner[i].asString()] = "";
+    if (inner[i].isString()) folders.AddInner(inner[i].asString(), "");
   }
   for (const std::string& path : stored.getMemberNames()) {
     if (path == kInner) continue;
-    Kinds& kinds = folders.kinds_[path];
+    Kinds kinds = {};
     for (size_t kind = 0; kind < kinds.size(); ++kind) {
-      GetJsonValue(kinds[kind], stored[path], kKindNames[kind], true);
+      GetJsonValue(kinds[kind], stored[path], kContentKindNames[kind], true);
     }
+    folders.Add(path, kinds);
   }
   return folders;
 }
@@ -54,7 +55,7 @@ ShareFolders ShareFolders::FromJson(const Json::Value& stored) {
 Json::Value ShareFolders::ToJson() const {
   Json::Value stored(Json::objectValue);
   for (const auto& [path, kinds] : kinds_) {
-    for (size_t kind = 0; kind < kinds.size(); ++kind) stored[path][kKindNames[kind]] = kinds[kind];
+    for (size_t kind = 0; kind < kinds.size(); ++kind) stored[path][kContentKindNames[kind]] = kinds[kind];
   }
   for (const auto& [path, name] : inner_) stored[kInner].append(path);
   return stored;
@@ -68,20 +69,21 @@ ShareFolders ShareFolders::Load(const std::string& share, const std::string& roo
     const std::string& path = folder->GetPath();
     if (!StringStartWith(path + "/", "/" + share + "/")) continue;
     loaded.any_paused_ = loaded.any_paused_ || folder->IsPaused();
-    // Of a path that stands twice, the first counts.
-    (void)loaded.kinds_.emplace(root + path.substr(1 + share.size()),
-                                Kinds{folder->IsDocument(), folder->IsAudio(), folder->IsVideo(), folder->IsPhoto()});
+    loaded.Add(root + path.substr(1 + share.size()), fileindex::KindsOf(*folder));
   }
-  loaded.inner_ = SharesBelow(root, folder_mgr);
+  for (const auto& [path, name] : SharesBelow(root, folder_mgr)) loaded.AddInner(path, name);
   return loaded;
 }
 
-const ShareFolders::Kinds* ShareFolders::Governing(std::string_view full_path) const {
-  for (size_t end = full_path.size(); end != std::string_view::npos && end > 0; end = full_path.rfind('/', end - 1)) {
-    const auto found = kinds_.find(full_path.substr(0, end));
-    if (found != kinds_.end()) return &found->second;
-  }
-  return nullptr;
+/// Of a path that stands twice, the first counts.
+void ShareFolders::Add(const std::string& full_path, const Kinds& kinds) {
+  (void)kinds_.emplace(full_path, kinds);
+  by_full_path_.Insert(full_path, kinds);
+}
+
+void ShareFolders::AddInner(const std::string& full_path, const std::string& share) {
+  inner_[full_path] = share;
+  inner_by_full_path_.Insert(full_path, true);
 }
 
 /// The names do not matter.
@@ -91,11 +93,7 @@ bool ShareFolders::SameInner(const ShareFolders& other) const {
 }
 
 bool ShareFolders::IsInInner(std::string_view full_path) const {
-  if (inner_.empty()) return false;
-  for (size_t end = full_path.size(); end != std::string_view::npos && end > 0; end = full_path.rfind('/', end - 1)) {
-    if (inner_.find(full_path.substr(0, end)) != inner_.end()) return true;
-  }
-  return false;
+  return !inner_.empty() && inner_by_full_path_.HasAtOrAbove(full_path);
 }
 
 ShareFolders::Place ShareFolders::PlaceOf(std::string_view full_path) const {
@@ -108,9 +106,7 @@ ShareFolders::Place ShareFolders::PlaceOf(std::string_view full_path) const {
 
 bool ShareFolders::WantsContent(const std::string& full_path) const {
   const Kinds* kinds = Governing(full_path);
-  if (kinds == nullptr) return false;
-  const auto type = static_cast<size_t>(fileindex::GetFileTypeByFullPath(full_path));
-  return type >= kinds->size() || (*kinds)[type];
+  return kinds != nullptr && fileindex::WantsContent(*kinds, full_path);
 }
 
 std::vector<std::string> ShareFolders::Topmost(const std::string& full_path) const {

@@ -1,6 +1,5 @@
 #pragma once
 
-#include <array>
 #include <cstddef>
 #include <map>
 #include <string>
@@ -9,13 +8,17 @@
 
 #include <json/forwards.h>
 
+#include "base/path_table.h"
+#include "fileindex/folders/folder_rule.h"
+
 namespace ferrox::indexd {
 
-/// The indexed folders of one share as they were configured at one moment: what decides, whatever the disk holds, which
-/// paths have a document and of which files the content is read. Of folders that lie in each other the deepest governs.
-/// Only the share's own folders count, also where another share lies in it; one that is indexed itself owns all in it,
-/// and none of it counts here. Whether the share has a recycle bin, which
-/// is not indexed, is part of the configuration. Safe for several threads.
+/// The indexed folders of one share as they were configured at one moment. They decide, whatever the disk holds, which
+/// paths have a document and of which files the content is read, by the library's rule
+/// (fileindex/folders/folder_rule.h) over the share's own folders. Another share that lies in this one and is indexed
+/// itself owns all in its folder: none of that counts here, whatever folder of this share lies above or in it. Whether
+/// the share has a recycle bin, which is not indexed, is part of the configuration. Safe for several threads once it is
+/// loaded.
 class ShareFolders {
  public:
   enum class Place {
@@ -57,16 +60,21 @@ class ShareFolders {
   bool DiffersInInnerAlone(const ShareFolders& other) const { return kinds_ == other.kinds_ && !SameInner(other); }
 
  private:
-  using Kinds = std::array<bool, 4>;  ///< in the order of fileindex::FileType
+  using Kinds = fileindex::ContentKinds;
 
+  void Add(const std::string& full_path, const Kinds& kinds);
+  void AddInner(const std::string& full_path, const std::string& share);
   bool SameInner(const ShareFolders& other) const;
   /// The kinds under which the path lies; null when it is under no folder.
-  const Kinds* Governing(std::string_view full_path) const;
+  const Kinds* Governing(std::string_view full_path) const { return fileindex::Governing(by_full_path_, full_path); }
 
   bool any_paused_ = false;
   bool recycle_bin_ = false;
   std::map<std::string, Kinds, std::less<>> kinds_;        ///< by full path
   std::map<std::string, std::string, std::less<>> inner_;  ///< names of shares by full path
+  // The same two, to be found from the paths below.
+  base::PathTable<Kinds> by_full_path_;
+  base::PathTable<bool> inner_by_full_path_;
 };
 
 }  // namespace ferrox::indexd

@@ -79,6 +79,26 @@ TEST_F(FoldersTest, EachChangeOfFoldersTouchesExactlyWhatDiffers) {
   }
 }
 
+/// The list of folders, which the operations and other programs ask, and the folders that the daemon holds of a share.
+TEST_F(FoldersTest, TheListAndTheDaemonDecideAlike) {
+  for (const Folders& configuration : kConfigurations) {
+    SCOPED_TRACE(testing::PrintToString(configuration));
+    SetFolders(configuration);
+    const fileindex::FolderMgr list;
+    const ShareFolders held = ShareFolders::Load(share, root);
+    const ShareFolders stored = ShareFolders::FromJson(held.ToJson());
+    for (const std::string below : {"", "/d", "/d/deep", "/d/deep/e/further", "/d-x", "/d0", "/f.txt", "/missing"}) {
+      for (const std::string name : {"", "/f.txt", "/f.mp3", "/f.mkv", "/f.jpg", "/f.other"}) {
+        const std::string path = root + below + name;
+        for (const ShareFolders* folders : {&held, &stored}) {
+          EXPECT_EQ(folders->PlaceOf(path) == ShareFolders::Place::kIndexed, list.IsFullPathIndexed(path)) << path;
+          EXPECT_EQ(folders->WantsContent(path), list.IsFullPathNeedMeta(path)) << path;
+        }
+      }
+    }
+  }
+}
+
 TEST_F(FoldersTest, RenameAcrossAnyBorder) {
   struct Row {
     const char* from;
