@@ -6,7 +6,7 @@
 #include <vector>
 
 #include "base/unique_fd.h"
-#include "services/kovanotifyd/queues/queue_router.h"
+#include "services/kovanotifyd/queues/queue_watch.h"
 
 namespace ferrox::notifyd {
 

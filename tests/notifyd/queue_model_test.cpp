@@ -197,25 +197,25 @@ TEST_F(QueueModelTest, EachChangedPathIsLookedAt) {
   }
 }
 
-TEST_F(QueueModelTest, FewPlacesCoverMany) {
+TEST_F(QueueModelTest, FewFoldersCoverMany) {
   for (int round = 0; round < 300; ++round) {
-    std::vector<Place> places;
+    std::vector<ComparedFolder> folders;
     std::set<std::string> roots;
     for (unsigned count = 1 + Random(200); count > 0; --count) {
       const std::string path = Path(2 + Random(4));
-      places.push_back({path, path.find('/', path.find('/', 1) + 1)});
-      roots.insert(path.substr(0, places.back().root_size));
+      folders.push_back({path, path.find('/', path.find('/', 1) + 1)});
+      roots.insert(path.substr(0, folders.back().root_size));
     }
     const size_t most = 1 + Random(20);
-    const std::vector<Place> cover = CoverPlaces(places, most);
+    const std::vector<ComparedFolder> cover = CoverFolders(folders, most);
     EXPECT_LE(cover.size(), std::max(most, roots.size()));
-    for (const Place& place : places) {
+    for (const ComparedFolder& folder : folders) {
       EXPECT_EQ(std::count_if(cover.begin(), cover.end(),
-                              [&](const Place& over) { return IsAtOrBelow(place.path, over.path); }),
+                              [&](const ComparedFolder& over) { return IsAtOrBelow(folder.path, over.path); }),
                 1)
-          << place.path;
+          << folder.path;
     }
-    for (const Place& place : cover) EXPECT_GE(place.path.size(), place.root_size);
+    for (const ComparedFolder& folder : cover) EXPECT_GE(folder.path.size(), folder.root_size);
   }
 }
 

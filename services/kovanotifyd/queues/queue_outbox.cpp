@@ -20,16 +20,16 @@ using fileindex::EVENT_RENAME;
 
 std::string_view ParentOf(std::string_view path) { return path.substr(0, path.rfind('/')); }
 
-/// What is to be compared for a line that is to be given up: a folder itself, of a file the folder that it is in.
-Place PlaceOf(const std::string& path, bool is_folder, size_t root_size) {
+/// What a comparison in place of a line has to compare: a folder itself; of a file, the folder that it is in.
+ComparedFolder ComparisonFor(const std::string& path, bool is_folder, size_t root_size) {
   const size_t size = is_folder ? path.size() : std::max(ParentOf(path).size(), root_size);
   return {size == 0 ? "/" : path.substr(0, size), root_size};
 }
 
 }  // namespace
 
-/// Whether the line asks for a look at all below its path.
-bool QueueOutbox::IsWhole(const Line& line) {
+/// Whether the line makes its reader compare everything below its path.
+bool QueueOutbox::CoversSubtree(const Line& line) {
   return line.event == EVENT_REINDEX || (line.is_folder && (line.event == EVENT_CREATE || line.event == EVENT_DELETE));
 }
 
@@ -38,30 +38,32 @@ const QueueOutbox::Line* QueueOutbox::OpenLine(std::string_view path) const {
   return place != nullptr ? &lines_[*place] : nullptr;
 }
 
-bool QueueOutbox::IsBelowWhole(std::string_view path) const {
+/// Whether an open line above the path stands for it.
+bool QueueOutbox::IsBelowSubtreeLine(std::string_view path) const {
   bool is_below = false;
-  if (whole_ == 0) return false;
-  open_.VisitUpwards(ParentOf(path), [&](size_t place) { return is_below = IsWhole(lines_[place]); });
+  if (subtree_lines_ == 0) return false;
+  open_.VisitUpwards(ParentOf(path), [&](size_t place) { return is_below = CoversSubtree(lines_[place]); });
   return is_below;
 }
 
-bool QueueOutbox::TellsContentOf(std::string_view path) const {
+bool QueueOutbox::CoversContentOf(std::string_view path) const {
   const Line* line = OpenLine(path);
   if (line != nullptr && (line->event & (EVENT_CREATE | EVENT_MODIFY | EVENT_REINDEX)) != 0) return true;
-  return IsBelowWhole(path);
+  return IsBelowSubtreeLine(path);
 }
 
 void QueueOutbox::Add(uint32_t event, const WatchedName& name, uint32_t mask) {
-  if (IsBelowWhole(name.path)) return;
+  if (IsBelowSubtreeLine(name.path)) return;
   if (const size_t* place = open_.Find(name.path)) return Fold(lines_[*place], event, name.is_folder, mask);
   const Line line = {event, name.is_folder, std::string(name.path), name.root_size};
   open_.Insert(line.path, lines_.size());
   Append(line);
 }
 
-/// The event of the one line that says what the line and a later event of its path say. The index daemon drops what
-/// follows a delete but a create, and by a create it looks at everything: a name that lives again is told by that.
-uint32_t QueueOutbox::Folded(const Line& line, uint32_t event, bool is_folder, uint32_t mask) {
+/// The event of one line for an open line and a later event of the same path. Behind a delete the reader takes nothing
+/// but a create, which makes it read all of the file: so a write behind a delete, whose create was not reported,
+/// becomes a create if the queue wants these.
+uint32_t QueueOutbox::FoldedEvent(const Line& line, uint32_t event, bool is_folder, uint32_t mask) {
   if (line.event == EVENT_REINDEX || line.is_folder != is_folder) return EVENT_REINDEX;
   switch (event) {
     case EVENT_MODIFY:
@@ -74,11 +76,11 @@ uint32_t QueueOutbox::Folded(const Line& line, uint32_t event, bool is_folder, u
 }
 
 void QueueOutbox::Fold(Line& line, uint32_t event, bool is_folder, uint32_t mask) {
-  const bool was_whole = IsWhole(line);
-  line.event = Folded(line, event, is_folder, mask);
+  const bool did_cover = CoversSubtree(line);
+  line.event = FoldedEvent(line, event, is_folder, mask);
   line.is_folder = line.is_folder || is_folder;
-  if (was_whole || !IsWhole(line)) return;
-  ++whole_;
+  if (did_cover || !CoversSubtree(line)) return;
+  ++subtree_lines_;
   may_cover_ = true;
 }
 
@@ -95,38 +97,38 @@ void QueueOutbox::AddRename(const WatchedName& old_name, const WatchedName& name
 }
 
 void QueueOutbox::Append(Line line) {
-  if (IsWhole(line)) {
-    ++whole_;
+  if (CoversSubtree(line)) {
+    ++subtree_lines_;
     may_cover_ = may_cover_ || !lines_.empty();
   }
   lines_.push_back(std::move(line));
-  if (lines_.size() > limit_) Bound();
+  if (lines_.size() > limit_) ReduceLines();
 }
 
 void QueueOutbox::Close(std::string_view path) {
   const Line* line = OpenLine(path);
   if (line == nullptr) return;
-  if (IsWhole(*line)) --whole_;
+  if (CoversSubtree(*line)) --subtree_lines_;
   open_.Erase(path);
 }
 
 void QueueOutbox::CloseAll() {
   open_ = {};
-  whole_ = 0;
+  subtree_lines_ = 0;
   may_cover_ = false;
 }
 
-void QueueOutbox::Tidy() {
-  if (!std::exchange(may_cover_, false) || whole_ == 0) return;
+void QueueOutbox::DropCovered() {
+  if (!std::exchange(may_cover_, false) || subtree_lines_ == 0) return;
   std::vector<Line> kept;
   base::PathTable<size_t> open;
-  size_t whole = whole_;
+  size_t whole = subtree_lines_;
   for (size_t i = 0; i < lines_.size(); ++i) {
     Line& line = lines_[i];
     const size_t* place = line.event == EVENT_RENAME ? nullptr : open_.Find(line.path);
     const bool is_open = place != nullptr && *place == i;
-    if (is_open && IsBelowWhole(line.path)) {
-      if (IsWhole(line)) --whole;
+    if (is_open && IsBelowSubtreeLine(line.path)) {
+      if (CoversSubtree(line)) --whole;
       continue;
     }
     if (is_open) open.Insert(line.path, kept.size());
@@ -134,31 +136,31 @@ void QueueOutbox::Tidy() {
   }
   lines_ = std::move(kept);
   open_ = std::move(open);
-  whole_ = whole;
+  subtree_lines_ = whole;
 }
 
-/// Called when the lines are too many. Leaves so few that it is long until the next time.
-void QueueOutbox::Bound() {
-  Tidy();
-  if (lines_.size() > max_ - max_ / 4) TakeFolders();
+/// Called at the limit. Leaves room for a quarter of max_, so that the work is spread over that many additions.
+void QueueOutbox::ReduceLines() {
+  DropCovered();
+  if (lines_.size() > max_ - max_ / 4) ReplaceByComparisons();
   limit_ = std::max(max_, lines_.size() + max_ / 4);
 }
 
-/// Puts comparisons of few folders in the place of all lines.
-void QueueOutbox::TakeFolders() {
-  std::vector<Place> places;
+/// Replaces all lines by the comparisons of at most a twentieth as many folders.
+void QueueOutbox::ReplaceByComparisons() {
+  std::vector<ComparedFolder> folders;
   for (const Line& line : lines_) {
-    places.push_back(PlaceOf(line.path, line.is_folder, line.root_size));
-    if (line.event == EVENT_RENAME) places.push_back(PlaceOf(line.path_old, line.is_folder, line.root_size_old));
+    folders.push_back(ComparisonFor(line.path, line.is_folder, line.root_size));
+    if (line.event == EVENT_RENAME) folders.push_back(ComparisonFor(line.path_old, line.is_folder, line.root_size_old));
   }
-  places = CoverPlaces(std::move(places), std::max<size_t>(max_ / 20, 1));
+  folders = CoverFolders(std::move(folders), std::max<size_t>(max_ / 20, 1));
   lines_.clear();
   open_ = {};
-  whole_ = places.size();
+  subtree_lines_ = folders.size();
   may_cover_ = false;
-  for (Place& place : places) {
-    open_.Insert(place.path, lines_.size());
-    lines_.push_back({EVENT_REINDEX, true, std::move(place.path), place.root_size});
+  for (ComparedFolder& folder : folders) {
+    open_.Insert(folder.path, lines_.size());
+    lines_.push_back({EVENT_REINDEX, true, std::move(folder.path), folder.root_size});
   }
 }
 

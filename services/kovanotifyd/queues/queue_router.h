@@ -8,70 +8,77 @@
 #include <vector>
 
 #include "services/kovanotifyd/change.h"
+#include "services/kovanotifyd/queues/queue_watch.h"
+#include "services/kovanotifyd/queues/queue_writer.h"
+#include "services/kovanotifyd/queues/watch_rules.h"
+#include "services/kovanotifyd/queues/write_debouncer.h"
 
 namespace ferrox::notifyd {
 
-/// One folder that a queue wants to hear of, as it was registered (docs/formats/notifyd.md).
-struct QueueWatch {
-  std::string path;
-  uint32_t mask = 0;
-  std::vector<std::string> ignore = {};
-};
-
-/// What people can see of one queue.
-struct QueueFigures {
-  uint64_t written = 0;          ///< lines appended since the daemon started
-  uint64_t held = 0;             ///< changes in memory that could not be appended yet
-  int64_t held_since = 0;        ///< when the oldest of them happened, seconds since the epoch; 0 without
-  std::string held_reason = {};  ///< why, in a sentence; "" without
-};
-
-/// Turns changes into lines of the queues that want to hear of them, and appends these. A change that lies in a watched
-/// folder of several queues goes to each of them; a rename that crosses the border of what a queue watches is a create
-/// or a delete for it. A file that is written to is reported when it is closed, or, still open, once it has been quiet,
-/// or at the latest after a few seconds, and not for each write. Changes of one path that wait together are one.
-/// Lines that cannot be appended (full disk, lock held elsewhere, a queue that nobody empties) are kept in memory in
-/// few words: what grows beyond a bound becomes the comparison of a folder. Belongs to one thread. Nothing here blocks
-/// longer than a write, but FlushAll.
+/// Turns changes into lines of the queues that watch their paths, and appends these lines to the queues' files.
+///
+/// The way of a change: WatchRules finds the queues, with the mask of each; writes to open files wait in a
+/// WriteDebouncer; each queue's QueueWriter joins the lines that wait together (QueueOutbox) and appends them.
+///
+/// A change in watched folders of several queues goes to each of them. A rename of which a queue watches only one side
+/// is a create or a delete for that queue. A file that is written to is reported when it is closed, or, while it stays
+/// open, once it has been quiet for some time, or at the latest after a few seconds, instead of for each write.
+///
+/// Belongs to one thread. Nothing here blocks longer than a write to a queue's file, except FlushAll.
 class QueueRouter {
  public:
   using TimePoint = std::chrono::steady_clock::time_point;
 
   struct Options {
-    std::chrono::milliseconds quiet{500};     ///< of a file that stays open
-    std::chrono::milliseconds longest{5000};  ///< what is written to all the time is reported so often
-    uint64_t held_max = 20000;                ///< changes of one queue in memory
-    uint64_t queue_bytes_max = 64U << 20;     ///< a queue that has grown to this is not appended to
+    std::chrono::milliseconds quiet{500};     ///< without a write, after which a file that stays open is reported
+    std::chrono::milliseconds longest{5000};  ///< from the first write, after which it is reported in any case
+    uint64_t held_max = 20000;                ///< lines of one queue in memory; beyond it they become comparisons
+    uint64_t queue_bytes_max = 64U << 20;     ///< a queue's file of this size is not appended to
   };
 
   explicit QueueRouter(const Options& options);
   QueueRouter(const QueueRouter&) = delete;
   QueueRouter& operator=(const QueueRouter&) = delete;
-  ~QueueRouter();
 
-  /// What each queue (by its path) wants to hear of from now on. Held lines of queues that stay are kept; those of
-  /// queues that are gone are dropped.
+  /// Replaces what each queue, by the path of its file, watches. Lines in memory are kept for queues that stay, and
+  /// dropped for those that are gone.
   void SetQueues(const std::map<std::string, std::vector<QueueWatch>>& queues);
 
-  /// Takes note of a change. Of a name in no watched folder, or ignored there, or of a kind that the queue's mask
-  /// leaves out, nothing comes.
+  /// Adds the lines of a change to the queues. Nothing is added for a path outside of all watched folders, an ignored
+  /// one, or a kind of change that is not in the queue's mask.
   void Put(const Change& change, TimePoint now);
-  /// Asks for the comparison of disk and index at and below a path, in each queue that watches it or something below
-  /// it; in the latter case, of what it watches. Also where the mask says nothing of it: changes may have been lost.
+  /// Asks for a comparison of disk and index at and below a path, in each queue that watches the path or a folder below
+  /// it; of the latter, only the watched folder is compared. Independent of the masks, since any change may have been
+  /// missed there.
   void PutComparison(const std::string& path);
 
-  /// Appends what is due. Returns when something else will be, or TimePoint::max().
+  /// Appends what is due. Returns when the next line will be due, or TimePoint::max() when none waits.
   TimePoint Flush(TimePoint now);
-  /// Appends all, also of files that are still being written to; waits up to 0.1 s for each queue's lock. "", or a
-  /// sentence that says which queue could not take everything and why.
+  /// Appends everything, including writes to files that are still open. Waits up to 0.1 s for the lock of each queue.
+  /// Returns "", or a sentence that names the queues that could not take all their lines, and why.
   std::string FlushAll(TimePoint now);
 
-  /// By the queue's path.
+  /// By the path of the queue's file.
   std::map<std::string, QueueFigures> Figures() const;
 
  private:
-  class Impl;
-  std::unique_ptr<Impl> impl_;
+  using Match = WatchRules::Match;
+
+  void PutTooLong(const Change& change);
+  void PutRename(const Change& change);
+  void AddRename(const Change& change, const Match& from, const Match& to);
+  void AddToQueues(uint32_t event, const std::string& path, bool is_folder);
+  void AddToQueue(const Match& match, uint32_t event, const std::string& path, bool is_folder);
+  bool IsWriteCovered(const std::string& path);
+  WriteDebouncer::Report ReportWrite();
+  WriteDebouncer::Report ReportWriteByNumber();
+
+  Options options_;
+  WatchRules rules_;
+  std::map<std::string, std::unique_ptr<QueueWriter>> by_path_;
+  std::vector<QueueWriter*> queues_;  ///< those of by_path_ in its order; WatchRules counts queues in that order
+  WriteDebouncer writes_;             ///< by path
+  WriteDebouncer writes_by_number_;   ///< by a key made of the file's number and a root (Change::Kind::kByNumber)
 };
 
 }  // namespace ferrox::notifyd

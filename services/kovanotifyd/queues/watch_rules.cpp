@@ -40,7 +40,7 @@ WatchRules::WatchRules(const std::map<std::string, std::vector<QueueWatch>>& que
   }
 }
 
-/// A folder that a queue names twice is watched for what either says.
+/// For a folder that a queue names twice, the masks are joined, and only names that both ignore are ignored.
 void WatchRules::Add(size_t queue, const QueueWatch& watch, std::map<std::string, std::vector<Rule>>& rules) {
   const std::string path = WithoutTrailingSlash(watch.path);
   std::vector<Rule>& of_path = rules[path];

@@ -1,4 +1,4 @@
-#include "services/kovanotifyd/queues/held_queue.h"
+#include "services/kovanotifyd/queues/queue_writer.h"
 
 #include <sys/stat.h>
 #include <syslog.h>
@@ -25,63 +25,79 @@ using std::chrono::milliseconds;
 
 constexpr milliseconds kFirstPause{100};
 constexpr milliseconds kLongestPause{5000};
-constexpr milliseconds kTellingPause{1600};
-/// As many numbers as a line can have, and more than are ever told but by a whole tree of links.
+/// A failure is logged once attempts have failed until the pause is this long: not one that a moment mends.
+constexpr milliseconds kLoggedPause{1600};
+/// As many numbers as one line of a queue can hold. More come at once only when a whole tree has second names.
 constexpr size_t kFilesMax = 5000;
+/// Of lines that are formatted and written together. Bounds memory.
 constexpr size_t kBytesAtOnce = 1U << 20;
 constexpr char kLockHeld[] = "its lock is held elsewhere";
+/// FlushAll spends at most 20 times 5 ms on the lock.
 constexpr int kLockAttempts = 20;
 constexpr milliseconds kLockPause{5};
 
 }  // namespace
 
-HeldQueue::HeldQueue(std::string path, const QueueRouter::Options& options)
+QueueWriter::QueueWriter(std::string path, const Limits& limits)
     : path_(std::move(path)),
-      bytes_max_(options.queue_bytes_max),
-      outbox_(static_cast<size_t>(std::min<uint64_t>(options.held_max, SIZE_MAX))) {}
+      bytes_max_(limits.bytes),
+      outbox_(static_cast<size_t>(std::min<uint64_t>(limits.lines, SIZE_MAX))) {}
 
-void HeldQueue::NoteAge() {
+void QueueWriter::NoteArrival() {
   if (oldest_ == 0 && Waiting() > 0) oldest_ = Clock::Get().Now();
 }
 
-void HeldQueue::NoteFile(uint64_t file, const std::string& watched) {
-  if (files_.size() < kFilesMax || files_.count(file) != 0) {
-    files_.insert(file);
-    files_folder_ = watched;
-  } else {
-    outbox_.Add(fileindex::EVENT_REINDEX, {watched, true, watched == "/" ? 0 : watched.size()},
-                fileindex::EVENT_REINDEX);
-  }
-  NoteAge();
+void QueueWriter::Add(uint32_t event, const WatchedName& name, uint32_t mask) {
+  outbox_.Add(event, name, mask);
+  NoteArrival();
 }
 
-HeldQueue::TimePoint HeldQueue::Flush(TimePoint now) {
+void QueueWriter::AddRename(const WatchedName& old_name, const WatchedName& name) {
+  outbox_.AddRename(old_name, name);
+  NoteArrival();
+}
+
+void QueueWriter::AddComparison(const WatchedName& folder) {
+  Add(fileindex::EVENT_REINDEX, folder, fileindex::EVENT_REINDEX);
+}
+
+void QueueWriter::AddFile(uint64_t file, const std::string& watched) {
+  if (files_.size() >= kFilesMax && files_.count(file) == 0) {
+    return AddComparison({watched, true, watched == "/" ? 0 : watched.size()});
+  }
+  files_.insert(file);
+  files_folder_ = watched;
+  NoteArrival();
+}
+
+QueueWriter::TimePoint QueueWriter::Flush(TimePoint now) {
   if (Waiting() == 0) return TimePoint::max();
-  if (now >= next_attempt_) Hold(Append(), now);
+  if (now >= next_attempt_) NoteOutcome(Append(), now);
   return Waiting() == 0 ? TimePoint::max() : next_attempt_;
 }
 
-std::string HeldQueue::FlushAll(TimePoint now) {
+std::string QueueWriter::FlushAll(TimePoint now) {
   std::string reason = Append();
   for (int attempt = 1; reason == kLockHeld && attempt < kLockAttempts; ++attempt) {
     Clock::Get().SleepFor(kLockPause);
     reason = Append();
   }
-  Hold(reason, now);
+  NoteOutcome(reason, now);
   return reason;
 }
 
-/// Takes note of how an attempt went, "" for well. What lasts is told in the log, once, and so is its end.
-void HeldQueue::Hold(std::string reason, TimePoint now) {
+/// Sets the pause until the next attempt; `reason` is "" after success. A failure that lasts is logged once, and so is
+/// its end.
+void QueueWriter::NoteOutcome(std::string reason, TimePoint now) {
   if (reason.empty()) {
-    if (pause_ >= kTellingPause) Log(LOG_NOTICE, "queue %s takes changes again", path_.c_str());
+    if (pause_ >= kLoggedPause) Log(LOG_NOTICE, "queue %s takes changes again", path_.c_str());
     pause_ = milliseconds(0);
     next_attempt_ = TimePoint::min();
   } else {
-    const bool was_told = pause_ >= kTellingPause;
+    const bool was_logged = pause_ >= kLoggedPause;
     pause_ = std::clamp(2 * pause_, kFirstPause, kLongestPause);
     next_attempt_ = now + pause_;
-    if (!was_told && pause_ >= kTellingPause) {
+    if (!was_logged && pause_ >= kLoggedPause) {
       const std::string holder = reason == kLockHeld ? kova::LockHolderText(path_) : std::string();
       Log(LOG_WARNING, "queue %s: changes are held in memory: %s%s", path_.c_str(), reason.c_str(),
           holder.empty() ? "" : (": " + holder).c_str());
@@ -90,8 +106,8 @@ void HeldQueue::Hold(std::string reason, TimePoint now) {
   reason_ = std::move(reason);
 }
 
-/// @return "", or why not everything could be appended.
-std::string HeldQueue::Append() {
+/// One attempt. @return "", or why not everything could be appended.
+std::string QueueWriter::Append() {
   if (Waiting() == 0) return {};
   struct stat status = {};
   if (lstat(path_.c_str(), &status) == 0 && static_cast<uint64_t>(status.st_size) >= bytes_max_) {
@@ -102,8 +118,9 @@ std::string HeldQueue::Append() {
   return AppendLocked();
 }
 
-std::string HeldQueue::AppendLocked() {
-  outbox_.Tidy();
+/// The caller holds the lock of the queue's file. Lines that were written are forgotten also when a later one fails.
+std::string QueueWriter::AppendLocked() {
+  outbox_.DropCovered();
   std::string reason;
   std::string text;
   size_t done = 0;
@@ -123,7 +140,8 @@ std::string HeldQueue::AppendLocked() {
   return reason;
 }
 
-std::string HeldQueue::AppendFiles() {
+/// The line of all numbers goes behind the others: it tells nothing that they depend on.
+std::string QueueWriter::AppendFiles() {
   if (files_.empty()) return {};
   std::string text;
   AppendFilesLine(text, files_folder_, files_);
@@ -133,7 +151,7 @@ std::string HeldQueue::AppendFiles() {
   return {};
 }
 
-QueueFigures HeldQueue::Figures() const {
+QueueFigures QueueWriter::Figures() const {
   QueueFigures figures;
   figures.written = written_;
   if (reason_.empty()) return figures;

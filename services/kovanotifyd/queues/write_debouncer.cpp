@@ -1,30 +1,30 @@
-#include "services/kovanotifyd/queues/open_files.h"
+#include "services/kovanotifyd/queues/write_debouncer.h"
 
 #include <utility>
 #include <vector>
 
 namespace ferrox::notifyd {
 
-bool OpenFiles::Touch(const std::string& path, TimePoint now) {
+bool WriteDebouncer::Touch(const std::string& path, TimePoint now) {
   const auto found = files_.find(path);
   if (found == files_.end()) return false;
   found->second.last = now;
   return true;
 }
 
-void OpenFiles::Add(const std::string& path, TimePoint now, const Report& report) {
+void WriteDebouncer::Add(const std::string& path, TimePoint now, const Report& report) {
   const auto [file, is_new] = files_.try_emplace(path, File{now, now});
   if (!is_new) {
     file->second.last = now;
     return;
   }
-  Schedule(file, DueOf(file->second));
+  SetDue(file, DueOf(file->second));
   while (files_.size() > max_) report(TakeFirst());
 }
 
 /// Calls `visit` for each file at the path and, of a folder, below it; it may remove that file.
 template <typename Visit>
-void OpenFiles::ForEachAt(const std::string& path, bool is_folder, const Visit& visit) {
+void WriteDebouncer::ForEachAt(const std::string& path, bool is_folder, const Visit& visit) {
   if (files_.empty()) return;
   if (const auto found = files_.find(path); found != files_.end()) visit(found);
   if (!is_folder) return;
@@ -32,23 +32,23 @@ void OpenFiles::ForEachAt(const std::string& path, bool is_folder, const Visit& 
   for (auto at = files_.lower_bound(prefix); at != files_.end() && at->first.starts_with(prefix);) visit(at++);
 }
 
-void OpenFiles::Forget(const std::string& path, bool is_folder) {
+void WriteDebouncer::Forget(const std::string& path, bool is_folder) {
   ForEachAt(path, is_folder, [this](Files::iterator file) { Remove(file); });
 }
 
-void OpenFiles::Move(const std::string& old_path, const std::string& path, bool is_folder) {
-  Forget(path, is_folder);  // what is replaced
+void WriteDebouncer::Move(const std::string& old_path, const std::string& path, bool is_folder) {
+  Forget(path, is_folder);
   std::vector<std::pair<std::string, File>> moved;
   ForEachAt(old_path, is_folder, [&](Files::iterator file) {
     moved.emplace_back(path + file->first.substr(old_path.size()), file->second);
     Remove(file);
   });
   for (const auto& [new_path, file] : moved) {
-    Schedule(files_.insert_or_assign(new_path, file).first, DueOf(file));
+    SetDue(files_.insert_or_assign(new_path, file).first, DueOf(file));
   }
 }
 
-void OpenFiles::ReportDue(TimePoint now, const Report& report) {
+void WriteDebouncer::ReportDue(TimePoint now, const Report& report) {
   while (NextDue() <= now) {
     const auto file = files_.find(*due_.begin()->second);
     const TimePoint due = DueOf(file->second);
@@ -56,21 +56,21 @@ void OpenFiles::ReportDue(TimePoint now, const Report& report) {
       report(TakeFirst());
     } else {
       (void)due_.erase(due_.begin());
-      Schedule(file, due);
+      SetDue(file, due);
     }
   }
 }
 
-void OpenFiles::ReportAll(const Report& report) {
+void WriteDebouncer::ReportAll(const Report& report) {
   while (!files_.empty()) report(TakeFirst());
 }
 
-void OpenFiles::Remove(Files::iterator file) {
+void WriteDebouncer::Remove(Files::iterator file) {
   (void)due_.erase(file->second.due);
   (void)files_.erase(file);
 }
 
-std::string OpenFiles::TakeFirst() {
+std::string WriteDebouncer::TakeFirst() {
   const auto file = files_.find(*due_.begin()->second);
   std::string path = file->first;
   Remove(file);
