@@ -7,10 +7,10 @@
 #include <unistd.h>
 
 #include <cerrno>
-#include <mutex>
 #include <utility>
 #include <vector>
 
+#include "base/mutex.h"
 #include "base/unique_fd.h"
 
 namespace ferrox::extract {
@@ -20,14 +20,17 @@ namespace {
 using SteadyClock = std::chrono::steady_clock;
 using std::chrono::milliseconds;
 
-/// For a process that was killed to be gone. One that used much memory takes seconds where the machine swaps; who takes
-/// it for held by a file system lets its file wait instead of blaming it.
+/// How long a killed process may take to be gone before it counts as held by a file system. One that used much memory
+/// takes seconds on a machine that swaps; taken for held, its file would wait instead of being blamed.
 constexpr milliseconds kEndMax(10000);
+/// Between two looks at a child where the kernel has no pidfd_open (before Linux 5.3).
 constexpr int kPollMs = 1;
 
+/// Killed children that a file system holds in the middle of a call. They stay ours to reap: a pid that is never waited
+/// for stays taken.
 struct HeldProcesses {
-  std::mutex mutex;
-  std::vector<pid_t> pids;
+  base::Mutex mutex;
+  std::vector<pid_t> pids BASE_GUARDED_BY(mutex);
 };
 HeldProcesses g_held;
 
@@ -39,13 +42,13 @@ bool ChildProcess::End() {
   (void)Wait(kEndMax);
   const pid_t held = std::exchange(pid_, -1);
   if (held <= 0) return true;
-  const std::lock_guard guard(g_held.mutex);
+  const base::MutexLock guard(g_held.mutex);
   g_held.pids.push_back(held);
   return false;
 }
 
 size_t ChildProcess::Held() {
-  const std::lock_guard guard(g_held.mutex);
+  const base::MutexLock guard(g_held.mutex);
   std::erase_if(g_held.pids, [](pid_t pid) { return waitpid(pid, nullptr, WNOHANG) != 0; });
   return g_held.pids.size();
 }

@@ -10,7 +10,7 @@ namespace ferrox::extract {
 
 std::list<OpenLimit::Opening>::iterator OpenLimit::Begin(const std::string& root) {
   const auto now = std::chrono::steady_clock::now();
-  const std::lock_guard guard(mutex_);
+  const base::MutexLock guard(mutex_);
   const auto held = std::count_if(openings_.begin(), openings_.end(), [&](const Opening& one) {
     return one.root == root && now - one.since >= options_.long_time;
   });
@@ -22,7 +22,7 @@ std::list<OpenLimit::Opening>::iterator OpenLimit::Begin(const std::string& root
 }
 
 void OpenLimit::End(std::list<Opening>::iterator opening) {
-  const std::lock_guard guard(mutex_);
+  const base::MutexLock guard(mutex_);
   openings_.erase(opening);
 }
 
@@ -30,7 +30,7 @@ Json::Value OpenLimit::Held() const {
   const auto now = std::chrono::steady_clock::now();
   std::set<std::string> roots;
   {
-    const std::lock_guard guard(mutex_);
+    const base::MutexLock guard(mutex_);
     for (const Opening& one : openings_) {
       if (now - one.since >= options_.long_time) roots.insert(one.root);
     }

@@ -2,15 +2,18 @@
 
 #include <chrono>
 #include <list>
-#include <mutex>
 #include <string>
 
 #include <json/value.h>
 
+#include "base/mutex.h"
+
 namespace ferrox::extract {
 
-/// Bounds how many threads file systems can hold that do not answer, as one of a network does whose server is away:
-/// those who open a file there cannot be told to stop. Files of other folders are opened meanwhile.
+/// Bounds how many threads hang in file systems that do not answer, such as a network file system whose server is away.
+/// A thread in open(2) or in a first read there cannot be interrupted; without a bound, a few requests for files of one
+/// dead mount would take every thread of the daemon, and files of other folders would wait too. Any thread may call any
+/// member; none blocks.
 class OpenLimit {
  private:
   struct Opening {
@@ -21,15 +24,15 @@ class OpenLimit {
  public:
   struct Options {
     unsigned at_once = 16;  ///< openings in all
-    unsigned held_max = 2;  ///< openings below one root that take long; beyond it there are no others
+    unsigned held_max = 2;  ///< openings below one root that last long; with so many, no further one begins there
     std::chrono::milliseconds long_time = std::chrono::seconds(5);
   };
   explicit OpenLimit(const Options& options) : options_(options) {}
 
-  /// A file below the folder `root` is being opened, or first read, for the life of this object.
+  /// Counts one opening, or first read, of a file below the folder `root` for the life of this object.
   class Turn {
    public:
-    /// @throws Error kInternal with a sentence when that is not to be tried now.
+    /// @throws Error kInternal with a sentence when a limit is reached; the file is then to be tried again later.
     Turn(OpenLimit& limit, const std::string& root) : limit_(limit), opening_(limit.Begin(root)) {}
     Turn(const Turn&) = delete;
     Turn& operator=(const Turn&) = delete;
@@ -40,7 +43,7 @@ class OpenLimit {
     std::list<Opening>::iterator opening_;
   };
 
-  /// The folders where somebody has waited for long: an array of texts.
+  /// The roots below which an opening has lasted for long_time or more: a JSON array of texts.
   Json::Value Held() const;
 
  private:
@@ -48,8 +51,8 @@ class OpenLimit {
   void End(std::list<Opening>::iterator opening);
 
   const Options options_;
-  mutable std::mutex mutex_;
-  std::list<Opening> openings_;  ///< the longest under way first
+  mutable base::Mutex mutex_;
+  std::list<Opening> openings_ BASE_GUARDED_BY(mutex_);  ///< the longest under way first
 };
 
 }  // namespace ferrox::extract

@@ -17,7 +17,8 @@ namespace {
 using kova::content::Program;
 using Outcome = WorkerProcess::Outcome;
 
-/// A worker may have ended while nobody looked; more than one in a row is no accident.
+/// How many workers are asked for one file, when they end before they have seen it: one may have died while it was
+/// idle.
 constexpr int kAttempts = 3;
 
 /// What a document says of a file that was not answered for.
@@ -34,8 +35,10 @@ const char* Reason(Outcome outcome) {
   }
 }
 
-/// Takes over what of an answer can be believed.
-bool Believe(const RawAnswer& raw, int region, const TextSink& text, Answer& answer) {
+/// Takes over what a worker answered, once all of it has passed the checks: its JSON is of the fields that a reader may
+/// set, the text lies in the region and is UTF-8, attachments lie within it. @return false for an answer that no reader
+/// gives, which only a worker taken over by its file sends.
+bool TakeChecked(const RawAnswer& raw, int region, const TextSink& text, Answer& answer) {
   std::vector<AttachedBytes> attachments;
   if (!ParseAnswer(raw.json, answer.fields, attachments) || !CopyText(region, raw.text_bytes, text)) return false;
   answer.text_bytes = raw.text_bytes;
@@ -50,7 +53,7 @@ bool Believe(const RawAnswer& raw, int region, const TextSink& text, Answer& ans
 
 }  // namespace
 
-/// A worker while it is busy; not given back, it ends.
+/// A worker on loan from the pool; returned by the destructor, or ended by End.
 class WorkerPool::Lease {
  public:
   Lease(WorkerPool& pool, Program program, bool fresh = false)
@@ -68,19 +71,19 @@ class WorkerPool::Lease {
   std::unique_ptr<WorkerProcess> worker_;
 };
 
-/// A worker while it reads a file.
+/// Registers a worker as reading a file, for Stop to interrupt.
 class WorkerPool::Asked {
  public:
   /// @throws Error kInternal when the pool stops.
   Asked(WorkerPool& pool, WorkerProcess& worker) : pool_(pool), worker_(worker) {
-    const std::lock_guard guard(pool_.mutex_);
+    const base::MutexLock guard(pool_.mutex_);
     pool_.FailIfStopping();
     pool_.asked_.push_back(&worker_);
   }
   Asked(const Asked&) = delete;
   Asked& operator=(const Asked&) = delete;
   ~Asked() {
-    const std::lock_guard guard(pool_.mutex_);
+    const base::MutexLock guard(pool_.mutex_);
     std::erase(pool_.asked_, &worker_);
   }
 
@@ -97,10 +100,10 @@ WorkerPool::~WorkerPool() {
 }
 
 void WorkerPool::Stop() {
-  const std::lock_guard guard(mutex_);
+  const base::MutexLock guard(mutex_);
   stopping_ = true;
   for (WorkerProcess* worker : asked_) worker->Interrupt();
-  something_to_end_.notify_one();
+  something_to_end_.NotifyOne();
 }
 
 void WorkerPool::FailIfStopping() const {
@@ -126,7 +129,7 @@ Answer WorkerPool::Read(Program program, const Task& task, const TextSink& text)
       const Asked asked(*this, lease.Worker());
       outcome = lease.Worker().Ask(task, options_.longest_read, raw);
     }
-    if (outcome == Outcome::kAnswered && !Believe(raw, lease.Worker().Region(), text, answer)) {
+    if (outcome == Outcome::kAnswered && !TakeChecked(raw, lease.Worker().Region(), text, answer)) {
       outcome = Outcome::kNonsense;
     }
     // What an earlier file has done to the memory of its worker may end it now: one that has read no other decides.
@@ -140,7 +143,8 @@ Answer WorkerPool::Read(Program program, const Task& task, const TextSink& text)
   FERROX_FAIL_IF(outcome == Outcome::kNotAsked, Error::kInternal, "the workers end before they are given a file");
   Count(outcome == Outcome::kAnswered);
   if (outcome == Outcome::kAnswered) return answer;
-  // All workers of a template have the same layout of memory: what has broken one shall not learn from it for the next.
+  // All workers forked from one template have the same layout of memory. A file that crashed one may have learnt
+  // addresses that would help the next: its successors are forked from a template with another layout.
   EndPrepared(program);
   Answer blame;
   blame.fields["_KOVAExtractError"] = Reason(outcome);
@@ -149,7 +153,7 @@ Answer WorkerPool::Read(Program program, const Task& task, const TextSink& text)
 
 /// @throws Error kInternal when it was the pool that ended the worker.
 void WorkerPool::Count(bool answered) {
-  const std::lock_guard guard(mutex_);
+  const base::MutexLock guard(mutex_);
   if (!answered) FailIfStopping();
   ++files_;
   if (!answered) ++blamed_;
@@ -166,10 +170,10 @@ std::unique_ptr<WorkerProcess> WorkerPool::TakeIdle(Program program) {
 std::unique_ptr<WorkerProcess> WorkerPool::Take(Program program, bool fresh) {
   std::unique_ptr<WorkerProcess> given_up;
   {
-    std::unique_lock lock(mutex_);
-    given_.wait(lock, [this] { return busy_ < options_.workers_max; });
+    const base::MutexLock lock(mutex_);
+    while (busy_ >= options_.workers_max) given_.Wait(mutex_);
     ++busy_;
-    if (std::exchange(nothing_to_end_, false)) something_to_end_.notify_one();
+    if (std::exchange(nothing_to_end_, false)) something_to_end_.NotifyOne();
     while (std::unique_ptr<WorkerProcess> worker = fresh ? nullptr : TakeIdle(program)) {
       if (worker->IsReady()) return worker;
     }
@@ -189,7 +193,7 @@ std::unique_ptr<WorkerProcess> WorkerPool::Take(Program program, bool fresh) {
 
 std::unique_ptr<WorkerProcess> WorkerPool::Fork(Program program) {
   Prepared& prepared = PreparedFor(program);
-  const std::lock_guard guard(prepared.mutex);
+  const base::MutexLock guard(prepared.mutex);
   prepared.used = SteadyClock::now();
   if (prepared.process == nullptr || !prepared.process->IsReady()) {
     prepared.process.reset();
@@ -206,13 +210,13 @@ std::unique_ptr<WorkerProcess> WorkerPool::Fork(Program program) {
 
 void WorkerPool::EndPrepared(Program program) {
   Prepared& prepared = PreparedFor(program);
-  const std::lock_guard guard(prepared.mutex);
+  const base::MutexLock guard(prepared.mutex);
   prepared.process.reset();
 }
 
 std::unique_ptr<WorkerProcess> WorkerPool::Start(Program program) {
   std::unique_ptr<WorkerProcess> worker = Fork(program);
-  const std::lock_guard guard(mutex_);
+  const base::MutexLock guard(mutex_);
   if (missing_ != worker->Missing()) {
     missing_ = worker->Missing();
     for (const Json::Value& piece : missing_) {
@@ -226,32 +230,34 @@ void WorkerPool::Give(std::unique_ptr<WorkerProcess> worker, Program program) {
   const bool kept = worker != nullptr && worker->FilesRead() < options_.files_per_worker;
   if (!kept) worker.reset();
   {
-    const std::lock_guard guard(mutex_);
+    const base::MutexLock guard(mutex_);
     --busy_;
     if (kept) idle_.push_back({std::move(worker), program, SteadyClock::now()});
   }
-  given_.notify_one();
+  given_.NotifyOne();
 }
 
 /// The thread that ends what has had nothing to do for long.
 void WorkerPool::EndIdle() {
-  std::unique_lock lock(mutex_);
+  base::MutexLock lock(mutex_);
   while (!stopping_) {
     std::vector<std::unique_ptr<WorkerProcess>> ended;
     const auto old = SteadyClock::now() - options_.idle_time;
     for (; !idle_.empty() && idle_.front().since < old; idle_.erase(idle_.begin())) {
       ended.push_back(std::move(idle_.front().worker));
     }
-    lock.unlock();
+    lock.Unlock();
     const bool templates_left = EndIdleTemplates(old);
     if (!ended.empty()) (void)malloc_trim(0);
     ended.clear();
-    lock.lock();
+    lock.Lock();
     nothing_to_end_ = busy_ == 0 && idle_.empty() && !templates_left;
     if (nothing_to_end_) {
-      something_to_end_.wait(lock, [this] { return stopping_ || !nothing_to_end_; });
+      while (!stopping_ && nothing_to_end_) something_to_end_.Wait(mutex_);
     } else {
-      something_to_end_.wait_for(lock, options_.idle_time / 4, [this] { return stopping_; });
+      const auto next_look = SteadyClock::now() + options_.idle_time / 4;
+      while (!stopping_ && something_to_end_.WaitUntil(mutex_, next_look)) {
+      }
     }
   }
 }
@@ -260,15 +266,19 @@ void WorkerPool::EndIdle() {
 bool WorkerPool::EndIdleTemplates(SteadyClock::time_point old) {
   bool left = false;
   for (Prepared& prepared : prepared_) {
-    const std::unique_lock guard(prepared.mutex, std::try_to_lock);
-    if (guard.owns_lock() && prepared.used < old) prepared.process.reset();
-    left = left || !guard.owns_lock() || prepared.process != nullptr;
+    if (!prepared.mutex.TryLock()) {  // it forks just now, so it is in use
+      left = true;
+      continue;
+    }
+    if (prepared.used < old) prepared.process.reset();
+    left = left || prepared.process != nullptr;
+    prepared.mutex.Unlock();
   }
   return left;
 }
 
 Json::Value WorkerPool::Status() const {
-  const std::lock_guard guard(mutex_);
+  const base::MutexLock guard(mutex_);
   Json::Value status;
   status["workers"] = Json::UInt64(busy_ + idle_.size());
   status["workers_max"] = options_.workers_max;

@@ -2,9 +2,7 @@
 
 #include <array>
 #include <chrono>
-#include <condition_variable>
 #include <memory>
-#include <mutex>
 #include <string>
 #include <thread>
 #include <vector>
@@ -13,6 +11,7 @@
 
 #include <kova/content_type.h>
 
+#include "base/mutex.h"
 #include "services/kovacontentextractd/answer.h"
 #include "services/kovacontentextractd/region.h"
 #include "services/kovacontentextractd/worker_process.h"
@@ -68,14 +67,14 @@ class WorkerPool {
 
   /// What makes the workers of a program; none when none was needed for long.
   struct Prepared {
-    std::mutex mutex;
-    std::unique_ptr<WorkerTemplate> process;
-    SteadyClock::time_point used;
+    base::Mutex mutex;  ///< held while a template starts or forks, which takes milliseconds; taken before the pool's
+    std::unique_ptr<WorkerTemplate> process BASE_GUARDED_BY(mutex);
+    SteadyClock::time_point used BASE_GUARDED_BY(mutex);
   };
 
   class Lease;
   class Asked;
-  std::unique_ptr<WorkerProcess> TakeIdle(kova::content::Program program);
+  std::unique_ptr<WorkerProcess> TakeIdle(kova::content::Program program) BASE_REQUIRES(mutex_);
   std::unique_ptr<WorkerProcess> Take(kova::content::Program program, bool fresh);
   void Give(std::unique_ptr<WorkerProcess> worker, kova::content::Program program);
   std::unique_ptr<WorkerProcess> Start(kova::content::Program program);
@@ -85,22 +84,23 @@ class WorkerPool {
   void EndIdle();
   bool EndIdleTemplates(SteadyClock::time_point old);
   void Count(bool answered);
-  void FailIfStopping() const;
+  void FailIfStopping() const BASE_REQUIRES(mutex_);
 
   const Options options_;
   std::array<Prepared, kova::content::kPrograms> prepared_;
-  mutable std::mutex mutex_;
-  std::condition_variable given_;  ///< a worker, back to the pool
-  std::condition_variable something_to_end_;
-  bool nothing_to_end_ = false;
-  std::vector<Idle> idle_;  ///< the longest idle first
-  unsigned busy_ = 0;
-  uint64_t files_ = 0;
-  uint64_t blamed_ = 0;
-  Json::Value missing_ = Json::Value(Json::arrayValue);
-  bool stopping_ = false;
-  std::vector<WorkerProcess*> asked_;  ///< those that are reading a file
-  std::thread ender_;
+  mutable base::Mutex mutex_;
+  base::ConditionVariable given_;  ///< a worker came back to the pool
+  base::ConditionVariable
+      something_to_end_;  ///< for the thread that ends idle ones: a worker is busy, or the pool stops
+  bool nothing_to_end_ BASE_GUARDED_BY(mutex_) = false;
+  std::vector<Idle> idle_ BASE_GUARDED_BY(mutex_);  ///< the longest idle first
+  unsigned busy_ BASE_GUARDED_BY(mutex_) = 0;       ///< leased out, or being started
+  uint64_t files_ BASE_GUARDED_BY(mutex_) = 0;      ///< read since the daemon's start
+  uint64_t blamed_ BASE_GUARDED_BY(mutex_) = 0;     ///< of these, those that cost their worker
+  Json::Value missing_ BASE_GUARDED_BY(mutex_) = Json::Value(Json::arrayValue);
+  bool stopping_ BASE_GUARDED_BY(mutex_) = false;
+  std::vector<WorkerProcess*> asked_ BASE_GUARDED_BY(mutex_);  ///< those that are reading a file
+  std::thread ender_;                                          ///< last: it uses all of the above
 };
 
 }  // namespace ferrox::extract

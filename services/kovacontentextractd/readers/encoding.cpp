@@ -9,9 +9,9 @@
 #include <cstring>
 #include <map>
 #include <memory>
-#include <mutex>
 #include <vector>
 
+#include "base/mutex.h"
 #include "services/kovacontentextractd/readers/utf8.h"
 
 namespace ferrox::extract {
@@ -63,19 +63,19 @@ class Converters {
   static constexpr size_t kKeptMax = 16;  // the content names encodings, and it may name many
 
   /// The C library loads and unloads under a lock of its own, which the thread sanitizer cannot see.
-  static std::mutex& LoadMutex() {
-    static auto* mutex = new std::mutex;  // never freed: threads may end after main
+  static base::Mutex& LoadMutex() {
+    static auto* mutex = new base::Mutex;  // never freed: threads may end after main
     return *mutex;
   }
 
   iconv_t Open(const std::string& encoding) {
     if (open_.size() >= kKeptMax) CloseAll();
-    const std::lock_guard<std::mutex> guard(LoadMutex());
+    const base::MutexLock guard(LoadMutex());
     return open_[encoding] = iconv_open("UTF-8", encoding.c_str());
   }
 
   void CloseAll() {
-    const std::lock_guard<std::mutex> guard(LoadMutex());
+    const base::MutexLock guard(LoadMutex());
     for (const auto& [name, converter] : open_) {
       if (converter != kNone) (void)iconv_close(converter);
     }
