@@ -17,7 +17,7 @@
 #include "fileindex/elastic/elastic_control.h"
 #include "fileindex/folders/folder_mgr.h"
 #include "fileindex/operations/index_mgr.h"
-#include "fileindex/optree/optree.h"
+#include "fileindex/queue/event.h"
 #include "fileindex/queue/queue_mgr.h"
 #include "fileindex/status_mgr.h"
 #include "fileindex/util.h"

@@ -15,6 +15,7 @@
 #include "fileindex/elastic/elastic_control.h"
 #include "fileindex/folders/folder_mgr.h"
 #include "fileindex/operations/index_mgr.h"
+#include "fileindex/queue/queue_file.h"
 #include "sdk/share.h"
 
 /// What the host's administrator, or a script, tells of shares, volumes, homes and users.
@@ -109,12 +110,12 @@ int RunShareForget(const Arguments& arguments) {
       arguments.words.size() > 1 ? AbsolutePath(arguments.words[1]) : sdk::SDKShare(name).GetPath();
   RequireEngine();
   const std::string queue = QueueOf(path);
-  const bool has_remains =
-      FolderMgr().IsShareIndexed(name) || HasIndex(name) || Exists(queue) || Exists(queue + ".tmp");
+  const bool has_remains = FolderMgr().IsShareIndexed(name) || HasIndex(name) || Exists(queue) ||
+                           Exists(fileindex::DetachedQueuePath(queue));
   if (!known && !has_remains) throw Failure("nothing is left of a share " + name + " at " + path + "; check both");
   const int code =
       ChangeAndReport([&] { fileindex::ShareClearPaused(name, path); }, "share " + name + " had no indexed folder");
-  RemoveQueue(queue);
+  fileindex::RemoveQueueFiles(queue);
   return code;
 }
 

@@ -22,7 +22,8 @@
 #include "fileindex/elastic/elastic_control.h"
 #include "fileindex/folders/folder_mgr.h"
 #include "fileindex/operations/index_mgr.h"
-#include "fileindex/optree/optree.h"
+#include "fileindex/queue/event.h"
+#include "fileindex/queue/queue_file.h"
 #include "fileindex/status_mgr.h"
 #include "fileindex/util.h"
 #include "sdk/share.h"
@@ -143,7 +144,7 @@ void Follow(const Move& move, void (*move_index)(const Move& move), const std::s
                                                   KOVA::KOVANOTIFYD::MONITOR_QUEUE_TYPE_APPLICATION);
     move_index(move);
     if (!paused) GoOn(move);
-    RemoveQueue(old_queue);
+    fileindex::RemoveQueueFiles(old_queue);
   } catch (const Error& error) {
     throw Failure(Explain(error, rest));
   } catch (const Failure& failure) {
@@ -164,7 +165,8 @@ bool HasDocumentsBelow(const std::string& share, const std::string& old_path) {
 bool HasRemains(const Move& move) {
   const std::string queue = QueueOf(move.old_path);
   return fileindex::FolderMgr().IsShareIndexed(move.old_name) || HasIndex(move.old_name) || Exists(queue) ||
-         Exists(queue + ".tmp") || IsPaused(move.new_name) || HasDocumentsBelow(move.new_name, move.old_path);
+         Exists(fileindex::DetachedQueuePath(queue)) || IsPaused(move.new_name) ||
+         HasDocumentsBelow(move.new_name, move.old_path);
 }
 
 /// What was renamed before, by Samba or by a run that was interrupted: the share has its new name.

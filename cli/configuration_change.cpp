@@ -13,6 +13,7 @@
 #include "common/log.h"
 #include "common/paths.h"
 #include "fileindex/folders/folder_mgr.h"
+#include "fileindex/queue/queue_file.h"
 #include "fileindex/status_mgr.h"
 #include "sdk/share.h"
 
@@ -81,7 +82,7 @@ bool IsPaused(const std::string& share) {
 }
 
 bool MarkIfBusy(const std::string& share) {
-  if (!IsFileExist(sdk::SDKShare(share).GetQueuePath() + ".tmp")) return false;
+  if (!IsFileExist(fileindex::DetachedQueuePath(sdk::SDKShare(share).GetQueuePath()))) return false;
   fileindex::StatusMgr().SetShareStatus(share, fileindex::StatusMgr::kNeedReindex);
   return true;
 }

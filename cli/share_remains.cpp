@@ -1,20 +1,19 @@
 #include "cli/share_remains.h"
 
-#include <kova/file_index.h>
 #include <kova/notifyd.h>
 
 #include "cli/ask.h"
 #include "common/error.h"
-#include "common/file_util.h"
 #include "common/log.h"
 #include "fileindex/elastic/elastic_control.h"
+#include "fileindex/queue/queue_file.h"
 
 namespace ferrox::cli {
 
 std::string QueueOf(const std::string& share_path) {
-  char path[4096] = {};
-  FERROX_FAIL_IF(0 > FILEIDXQueuePathCompose(share_path.c_str(), path, sizeof(path)), Error::kInternal,
-                 "FILEIDXQueuePathCompose failed, share_path=" + share_path);
+  std::string path = fileindex::ComposeQueuePath(share_path);
+  FERROX_FAIL_IF_AS(path.empty(), "0 > FILEIDXQueuePathCompose(share_path.c_str(), path, sizeof(path))",
+                    Error::kInternal, "FILEIDXQueuePathCompose failed, share_path=" + share_path);
   return path;
 }
 
@@ -24,10 +23,6 @@ bool HasIndex(const std::string& share) {
     if (index["id"].asString() == id) return true;
   }
   return false;
-}
-
-void RemoveQueue(const std::string& queue_path) {
-  for (const char* suffix : {"", ".tmp", ".folders"}) (void)Unlink(queue_path + suffix);
 }
 
 void Unregister(const std::string& queue_path) {
@@ -44,7 +39,7 @@ void DropRemains(const std::string& share, const std::string& queue_path) {
   } catch (const Error& error) {
     if (error.Code() != Error::kEngineNoSuchIndex) throw;
   }
-  RemoveQueue(queue_path);
+  fileindex::RemoveQueueFiles(queue_path);
 }
 
 }  // namespace ferrox::cli

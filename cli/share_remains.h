@@ -10,10 +10,6 @@ std::string QueueOf(const std::string& share_path);
 /// Whether the engine has an index of that share. @throws Failure as AskEngine.
 bool HasIndex(const std::string& share);
 
-/// Removes the queue of a share that is no longer there, with what the index daemon keeps beside it: it would be taken
-/// for that of a later share of the same folder. Missing files and failures do not matter.
-void RemoveQueue(const std::string& queue_path);
-
 /// Drops what may be left of a share without indexed folders: its worker, its index and its queue.
 /// @throws Error as the engine's commands do.
 void DropRemains(const std::string& share, const std::string& queue_path);

@@ -12,7 +12,7 @@
 #include "common/log.h"
 #include "fileindex/folders/folder.h"
 #include "fileindex/folders/folder_mgr.h"
-#include "fileindex/optree/optree.h"
+#include "fileindex/queue/event.h"
 #include "fileindex/queue/queue_mgr.h"
 #include "fileindex/status_mgr.h"
 #include "fileindex/util.h"

@@ -16,8 +16,8 @@
 #include "fileindex/folders/folder_mgr.h"
 #include "fileindex/operations/index_mgr.h"
 #include "fileindex/operations/operation_steps.h"
-#include "fileindex/optree/optree.h"
 #include "fileindex/queue/custom_event.h"
+#include "fileindex/queue/event.h"
 #include "fileindex/util.h"
 
 namespace ferrox::fileindex {

@@ -26,6 +26,7 @@
 #include "fileindex/folders/folder_mgr.h"
 #include "fileindex/operations/index_mgr.h"
 #include "fileindex/operations/watch_list.h"
+#include "fileindex/queue/queue_file.h"
 #include "fileindex/status_mgr.h"
 #include "fileindex/util.h"
 #include "sdk/share.h"
@@ -74,11 +75,11 @@ bool IsRemovable(const std::string& path) {
   return StringStartWith(path, "/") && !name.empty() && name != "." && name != "..";
 }
 
-/// What the platform composes from the share's path, "" when it cannot.
-std::string ComposePath(int (*compose)(const char*, char*, size_t), const std::string& share_path) {
+/// Where the index of the share with that folder lies; "" when the platform cannot say.
+std::string ComposeDBPath(const std::string& share_path) {
   const LockMutex guard(sdk::SDKMutex());
   char path[kPathBytes] = {};
-  return 0 > compose(share_path.c_str(), path, sizeof(path)) ? std::string() : path;
+  return 0 > FILEIDXDBPathCompose(share_path.c_str(), path, sizeof(path)) ? std::string() : path;
 }
 
 /// Removes what lies at `path`, whatever it is; a failure shows when the place is used again.
@@ -134,13 +135,13 @@ void DeleteKOVANotifydCfg(const std::string& share_name) {
 }
 
 void CleanShareIndexData(const std::string& share, const std::string& share_path) {
-  const std::string queue_path = ComposePath(&FILEIDXQueuePathCompose, share_path);
+  const std::string queue_path = ComposeQueuePath(share_path);
   FERROX_FAIL_IF_AS(!IsRemovable(queue_path),
                     "0 > FILEIDXQueuePathCompose(share_path.c_str(), queue_path, sizeof(queue_path))", Error::kInternal,
                     "FILEIDXQueuePathCompose failed, share_path=" + share_path);
   Remove(queue_path);
-  Remove(queue_path + ".tmp");
-  const std::string db_path = ComposePath(&FILEIDXDBPathCompose, share_path);
+  Remove(DetachedQueuePath(queue_path));
+  const std::string db_path = ComposeDBPath(share_path);
   FERROX_FAIL_IF_AS(!IsRemovable(db_path), "0 > FILEIDXDBPathCompose(share_path.c_str(), db_path, sizeof(db_path))",
                     Error::kInternal, "FILEIDXDBPathCompose failed, share_path=" + share_path);
   Remove(db_path);

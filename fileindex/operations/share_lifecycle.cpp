@@ -13,7 +13,7 @@
 #include "fileindex/operations/index_mgr.h"
 #include "fileindex/operations/operation_steps.h"
 #include "fileindex/operations/related_services.h"
-#include "fileindex/optree/optree.h"
+#include "fileindex/queue/event.h"
 #include "fileindex/status_mgr.h"
 #include "fileindex/util.h"
 #include "sdk/share.h"

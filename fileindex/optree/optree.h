@@ -11,9 +11,10 @@
 #include <json/value.h>
 
 #include "common/export.h"
+#include "fileindex/queue/event.h"
 
-/// Queue lines, the operations that they ask for, and the tree that folds the events of each path into as few
-/// operations as give the same end state. The line's format is described in docs/formats/queue.md.
+/// The operations that queue lines (fileindex/queue/event.h) ask for, and the tree that folds the events of each path
+/// into as few operations as give the same end state.
 namespace ferrox::fileindex {
 
 class OPArena;
@@ -22,34 +23,6 @@ struct EventFields;
 struct OP;
 struct OPBranch;
 struct OPNode;
-
-/// Bits of a queue line's "event", in the order in which they are handled.
-enum EventBit : uint32_t {
-  EVENT_CREATE = 0x40,
-  EVENT_ATTR = 0x4,
-  EVENT_MODIFY = 0x2,
-  EVENT_DELETE = 0x80,
-  EVENT_RENAME = 0x100,
-  EVENT_REINDEX = 0x10000,
-  EVENT_UPDATE_CFG = 0x20000,
-  EVENT_QUEUE_CRASHED = 0x200,
-};
-
-/// A queue line over this length is malformed.
-constexpr size_t kQueueLineMaxBytes = 256 * 1024;
-
-/// One queue line.
-struct FERROX_EXPORT Event {
-  /// @throws Error kMalformedEvent "Malformed event_raw: <line>" when the line is not one JSON value, is over
-  /// kQueueLineMaxBytes or holds a NUL; kBadArgument when "event" or "path" is missing or unusable.
-  explicit Event(const std::string& event_raw);
-
-  uint32_t event = 0;  ///< a set of EventBit
-  bool is_dir = false;
-  std::string path;      ///< full path; of a rename, the new one
-  std::string path_old;  ///< of a rename, the old full path
-  Json::Value data;      ///< of a configuration change, its flags
-};
 
 /// What the index daemon is to do. The numbers are fixed.
 enum FileIndexOP : int32_t {

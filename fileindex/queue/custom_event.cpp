@@ -12,12 +12,11 @@
 #include <json/value.h>
 
 #include "base/path_table.h"
-#include "common/json_util.h"
-#include "common/line_file.h"
-#include "common/lock_file.h"
 #include "common/log.h"
 #include "common/new_class.h"
-#include "fileindex/optree/optree.h"
+#include "fileindex/queue/event.h"
+#include "fileindex/queue/queue_file.h"
+#include "fileindex/queue/queue_line.h"
 #include "fileindex/queue/queue_mgr.h"
 #include "fileindex/status_mgr.h"
 #include "fileindex/util.h"
@@ -27,24 +26,17 @@ namespace ferrox::fileindex {
 
 namespace {
 
-std::string EventLine(int event, const std::string& path, const std::string& path_old, const Json::Value& data) {
-  Json::Value line(Json::objectValue);
-  line["event"] = event;
-  line["path"] = path;
-  line["path_old"] = path_old;
-  line["data"] = data;
-  return toString(line) + "\n";
-}
-
-/// Says, given a queue, whether a reindex that waits in it will see whatever the event would tell.
+/// Says, given a queue, whether a reindex that waits in it covers the path of the event: it is carried out later than
+/// what the event reports happened, so the event would add nothing.
 using IsCovered = std::function<bool(const std::string& queue_path)>;
 
 void QueueEvent(const std::string& queue_path, const std::string& path, const std::string& line,
                 const IsCovered& is_covered) {
   if (is_covered(queue_path)) return;
   FERROX_FAIL_IF(line.size() - 1 > kQueueLineMaxBytes, Error::kInternal, "Event too long for a queue, path=" + path);
-  const LockFile lock(queue_path, true);
-  FERROX_FAIL_IF(!AppendLines(queue_path, line), Error::kInternal, "Failed to write queue, reason=" + ErrnoText());
+  const LockedQueue queue(queue_path);
+  FERROX_FAIL_IF_AS(!queue.Append(line), "!AppendLines(queue_path, line)", Error::kInternal,
+                    "Failed to write queue, reason=" + ErrnoText());
 }
 
 /// Queues the event; when that fails, the share is marked instead.
@@ -95,7 +87,7 @@ class QueuedReindexes {
 };
 
 void AddCustomEvent(int event, const std::string& path, const std::string& path_old, const Json::Value& data) {
-  QueueOrMark(path, EventLine(event, path, path_old, data),
+  QueueOrMark(path, CustomEventLine(event, path, path_old, data),
               [&path](const std::string& queue_path) { return QueueMgr(queue_path).IsFullPathHasReindex(path); });
 }
 
@@ -104,7 +96,7 @@ CustomEventWriter::~CustomEventWriter() = default;
 
 void CustomEventWriter::Add(int event, const std::string& path, const std::string& path_old, const Json::Value& data) {
   QueuedReindexes* queued = nullptr;
-  QueueOrMark(path, EventLine(event, path, path_old, data), [&](const std::string& queue_path) {
+  QueueOrMark(path, CustomEventLine(event, path, path_old, data), [&](const std::string& queue_path) {
     std::unique_ptr<QueuedReindexes>& known = queues_[queue_path];
     if (known == nullptr) known = std::make_unique<QueuedReindexes>(queue_path);
     queued = known.get();

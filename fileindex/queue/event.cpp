@@ -1,9 +1,10 @@
 #define FERROX_SOURCE "optree"
 
+#include "fileindex/queue/event.h"
+
 #include "common/error.h"
 #include "common/json_util.h"
 #include "common/log.h"
-#include "fileindex/optree/optree.h"
 #include "fileindex/queue/event_scan.h"
 
 namespace ferrox::fileindex {

@@ -9,7 +9,7 @@
 #include <cstring>
 
 #include "common/log.h"
-#include "fileindex/optree/optree.h"
+#include "fileindex/queue/event.h"
 
 namespace ferrox::fileindex {
 

@@ -11,10 +11,12 @@
 #include "fileindex/optree/op_path.h"
 #include "fileindex/optree/optree.h"
 #include "fileindex/queue/event_line_reader.h"
+#include "fileindex/queue/queue_file.h"
 
 namespace ferrox::fileindex {
 
-QueueMgr::QueueMgr(const std::string& queue_path) : queue_path_(queue_path), queue_path_tmp_(queue_path + ".tmp") {}
+QueueMgr::QueueMgr(const std::string& queue_path)
+    : queue_path_(queue_path), queue_path_tmp_(DetachedQueuePath(queue_path)) {}
 
 void QueueMgr::DeleteTmp() {
   (void)Unlink(queue_path_tmp_);

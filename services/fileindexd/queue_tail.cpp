@@ -10,7 +10,8 @@
 
 #include "base/unique_fd.h"
 #include "common/error.h"
-#include "fileindex/optree/optree.h"
+#include "fileindex/queue/event.h"
+#include "fileindex/queue/queue_line.h"
 
 namespace ferrox::indexd {
 
@@ -30,14 +31,11 @@ void TakeChangedFile(const std::string& line, std::set<std::string>& files) {
   }
 }
 
-/// So the lines begin that tell files by their numbers: a queue may be long, and few of its lines are such.
-constexpr char kNumbersBegin[] = "{\"event\":0,";
-
 void TakeNumbers(const std::string& line, std::set<uint64_t>& files) {
   try {
     const fileindex::Event event(line);
-    if (!event.data.isObject() || !event.data["files"].isArray()) return;
-    for (const Json::Value& file : event.data["files"]) {
+    if (!event.data.isObject() || !event.data[fileindex::kFilesMember].isArray()) return;
+    for (const Json::Value& file : event.data[fileindex::kFilesMember]) {
       if (file.isUInt64() && files.size() <= kChangedNumbersMax) files.insert(file.asUInt64());
     }
   } catch (const Error&) {
@@ -77,7 +75,7 @@ std::set<uint64_t> ChangedNumbersIn(const std::string& queue_path) {
   std::set<uint64_t> files;
   for (off_t at = 0, before = -1; at != std::exchange(before, at);) {
     at = ReadQueueLines(queue_path, at, [&files](const std::string& line) {
-      if (line.starts_with(kNumbersBegin)) TakeNumbers(line, files);
+      if (line.starts_with(fileindex::kFilesLineBegin)) TakeNumbers(line, files);
       return true;
     });
   }

@@ -18,6 +18,7 @@
 #include "common/log.h"
 #include "common/paths.h"
 #include "fileindex/optree/optree.h"
+#include "fileindex/queue/queue_file.h"
 #include "fileindex/queue/queue_mgr.h"
 #include "fileindex/status_mgr.h"
 #include "fileindex/util.h"
@@ -103,7 +104,7 @@ ShareWorker::ShareWorker(const std::string& share, const Environment& environmen
       queue_path_(sdk::SDKShare(share).GetQueuePath()),
       environment_(environment),
       index_(environment.open_index(share)),
-      applied_(queue_path_ + ".folders"),
+      applied_(fileindex::AppliedFoldersPath(queue_path_)),
       watch_({queue_path_}) {}
 
 void ShareWorker::Start() {
@@ -185,7 +186,7 @@ std::string ShareWorker::AwaitSync(uint64_t request, QueueProgress::TimePoint en
 /// In this order: what leaves the live queue is in the detached one until the index has it.
 bool ShareWorker::NothingWaits() const {
   if (!settled_ || look_at_index_ || inner_changes_ != inner_changes_seen_ || HasContent(queue_path_) ||
-      IsFileExist(queue_path_ + ".tmp"))
+      IsFileExist(fileindex::DetachedQueuePath(queue_path_)))
     return false;
   try {
     return (StatusMgr().GetShareStatus(share_) & StatusMgr::kNeedReindex) == 0;
@@ -338,7 +339,7 @@ void ShareWorker::RunOnce() {
   const ShareFolders folders = LoadFolders();
   EnsureIndex();
   if (look_at_index_.exchange(false)) FollowRebuilding();
-  const std::string detached = queue_path_ + ".tmp";
+  const std::string detached = fileindex::DetachedQueuePath(queue_path_);
   // A pass looks at the folders of shares in this one that came or went; nobody queues anything for that.
   const bool is_queued = HasContent(queue_path_) || IsFileExist(detached);
   if (!is_queued && folders.DiffersInInnerAlone(applied_.Get())) (void)Queue(kPassEvent, root_);
@@ -479,10 +480,10 @@ void ShareWorker::RunPass() {
   CheckShare();
   fileindex::QueueMgr queue(queue_path_);
   AwaitFreeQueue();
-  if (!queue.PrepareTmpQueue() && !IsFileExist(queue_path_ + ".tmp")) return;
+  if (!queue.PrepareTmpQueue() && !IsFileExist(fileindex::DetachedQueuePath(queue_path_))) return;
   // Only now: of folders that are changed later, the events are in a later queue.
   const ShareFolders folders = LoadFolders();
-  const std::set<uint64_t> changed_files = ChangedNumbersIn(queue_path_ + ".tmp");
+  const std::set<uint64_t> changed_files = ChangedNumbersIn(fileindex::DetachedQueuePath(queue_path_));
   OperationRunner runner({share_, root_, folders, *index_, environment_.pool, interruption_, status_, held, queue_path_,
                           environment_.keep_up_interval, changed_files, !strays_looked_for_, applied_.Get(),
                           [&] { AwaitOtherFolders(folders); }, written_ahead_});
@@ -600,10 +601,10 @@ Json::Value ShareWorker::Status(std::chrono::milliseconds engine_wait) {
   const bool pause_over = json["state"] == "paused" && !json.isMember("detail") && !environment_.pause.Paused();
   if (pause_over) json["state"] = "starting";
   const uint64_t operations = json["operations"].asUInt64();
-  const uint64_t detached =
-      operations != 0 ? operations - json["operations_done"].asUInt64() : CountLines(queue_path_ + ".tmp");
+  const uint64_t detached = operations != 0 ? operations - json["operations_done"].asUInt64()
+                                            : CountLines(fileindex::DetachedQueuePath(queue_path_));
   json["queued"] = Json::UInt64(detached + CountLines(queue_path_));
-  const int64_t oldest = OldestChange({queue_path_ + ".tmp", queue_path_});
+  const int64_t oldest = OldestChange({fileindex::DetachedQueuePath(queue_path_), queue_path_});
   if (oldest > 0) json["oldest_change"] = Json::Int64(oldest);
   json["index"] = index_->Figures(engine_wait);
   const Json::Value& index = json["index"];

@@ -7,7 +7,7 @@
 #include <random>
 
 #include "common/lock_file.h"
-#include "fileindex/optree/optree.h"
+#include "fileindex/queue/event.h"
 #include "fileindex/status_mgr.h"
 #include "fileindex/util.h"
 #include "sdk/share.h"

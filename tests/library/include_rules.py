@@ -34,12 +34,9 @@ FORWARDING = {f"fileindex/{name}.h" for name in ("folder", "folder_mgr", "index_
 FORWARDING |= {"common/unique_fd.h", "common/scope_exit.h", "fileindex/elastic/fields.h"}
 # What reaches further, and why.
 EXCEPTIONS = {
-    # An event knows its line's limit; a queue is read into a tree, and one that is searched keeps the folders loaded.
-    "fileindex/queue/event.cpp": ["fileindex/optree/optree.h"],
-    "fileindex/queue/event_line_reader.cpp": ["fileindex/optree/optree.h"],
+    # A queue is read into a tree, and one that is searched keeps the folders loaded.
     "fileindex/queue/queue_mgr.cpp": ["fileindex/optree/optree.h", "fileindex/optree/op_path.h",
                                       "fileindex/folders/folder_mgr.h"],
-    "fileindex/queue/custom_event.cpp": ["fileindex/optree/optree.h"],
     # The daemons' main functions know the host that they run on: its table of shares, its registry, its services.
     "services/fileindexd/main.cpp": ["platform/host/share_table.h", "platform/host/mounts.h"],
     "services/kovanotifyd/main.cpp": ["platform/host/configuration.h", "platform/host/notify_registry.h"],

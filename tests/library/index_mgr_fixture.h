@@ -7,7 +7,7 @@
 
 #include "fileindex/folders/folder_mgr.h"
 #include "fileindex/operations/index_mgr.h"
-#include "fileindex/optree/optree.h"
+#include "fileindex/queue/event.h"
 #include "sdk/share.h"
 #include "tests/support/library_test.h"
 #include "tests/support/unix_server.h"

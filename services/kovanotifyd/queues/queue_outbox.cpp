@@ -3,9 +3,9 @@
 #include <algorithm>
 #include <utility>
 
-#include "fileindex/optree/optree.h"
+#include "fileindex/queue/event.h"
+#include "fileindex/queue/queue_line.h"
 #include "services/kovanotifyd/queues/folder_cover.h"
-#include "services/kovanotifyd/queues/queue_line.h"
 
 namespace ferrox::notifyd {
 
@@ -169,7 +169,7 @@ size_t QueueOutbox::Format(size_t first, size_t max_bytes, std::string& text) co
   const size_t end = text.size() + max_bytes;
   for (; at < lines_.size() && text.size() < end; ++at) {
     const Line& line = lines_[at];
-    AppendQueueLine(text, line.event, line.is_folder, line.path, line.path_old);
+    fileindex::AppendChangeLine(text, line.event, line.is_folder, line.path, line.path_old);
   }
   return at - first;
 }

@@ -6,7 +6,7 @@
 #include <string_view>
 #include <utility>
 
-#include "fileindex/optree/optree.h"
+#include "fileindex/queue/event.h"
 
 namespace ferrox::notifyd {
 

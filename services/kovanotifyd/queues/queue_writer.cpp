@@ -11,11 +11,10 @@
 #include <kova/lock_holder.h>
 
 #include "common/clock.h"
-#include "common/line_file.h"
-#include "common/lock_file.h"
 #include "common/log.h"
-#include "fileindex/optree/optree.h"
-#include "services/kovanotifyd/queues/queue_line.h"
+#include "fileindex/queue/event.h"
+#include "fileindex/queue/queue_file.h"
+#include "fileindex/queue/queue_line.h"
 
 namespace ferrox::notifyd {
 
@@ -113,13 +112,13 @@ std::string QueueWriter::Append() {
   if (lstat(path_.c_str(), &status) == 0 && static_cast<uint64_t>(status.st_size) >= bytes_max_) {
     return "it has grown to " + std::to_string(status.st_size >> 20) + " MiB and nobody empties it";
   }
-  const auto lock = LockFile::Try(path_, true);
-  if (lock == nullptr) return errno == EWOULDBLOCK ? kLockHeld : "it cannot be opened: " + ErrnoText();
-  return AppendLocked();
+  const auto queue = fileindex::LockedQueue::Try(path_);
+  if (queue == nullptr) return errno == EWOULDBLOCK ? kLockHeld : "it cannot be opened: " + ErrnoText();
+  return AppendTo(*queue);
 }
 
-/// The caller holds the lock of the queue's file. Lines that were written are forgotten also when a later one fails.
-std::string QueueWriter::AppendLocked() {
+/// Lines that were written are forgotten also when a later one fails.
+std::string QueueWriter::AppendTo(const fileindex::LockedQueue& queue) {
   outbox_.DropCovered();
   std::string reason;
   std::string text;
@@ -127,7 +126,7 @@ std::string QueueWriter::AppendLocked() {
   while (done < outbox_.Size()) {
     text.clear();
     const size_t count = outbox_.Format(done, kBytesAtOnce, text);
-    if (!AppendLines(path_, text)) {
+    if (!queue.Append(text)) {
       reason = "it cannot be written: " + ErrnoText();
       break;
     }
@@ -135,17 +134,17 @@ std::string QueueWriter::AppendLocked() {
   }
   outbox_.RemoveFirst(done);
   written_ += done;
-  if (reason.empty()) reason = AppendFiles();
+  if (reason.empty()) reason = AppendFilesTo(queue);
   if (Waiting() == 0) oldest_ = 0;
   return reason;
 }
 
 /// The line of all numbers goes behind the others: it tells nothing that they depend on.
-std::string QueueWriter::AppendFiles() {
+std::string QueueWriter::AppendFilesTo(const fileindex::LockedQueue& queue) {
   if (files_.empty()) return {};
   std::string text;
-  AppendFilesLine(text, files_folder_, files_);
-  if (!AppendLines(path_, text)) return "it cannot be written: " + ErrnoText();
+  fileindex::AppendFilesLine(text, files_folder_, files_);
+  if (!queue.Append(text)) return "it cannot be written: " + ErrnoText();
   files_.clear();
   ++written_;
   return {};

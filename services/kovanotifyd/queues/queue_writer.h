@@ -7,6 +7,10 @@
 
 #include "services/kovanotifyd/queues/queue_outbox.h"
 
+namespace ferrox::fileindex {
+class LockedQueue;
+}
+
 namespace ferrox::notifyd {
 
 /// What people can see of one queue.
@@ -60,8 +64,8 @@ class QueueWriter {
   size_t Waiting() const { return outbox_.Size() + (files_.empty() ? 0 : 1); }
   void NoteArrival();
   std::string Append();
-  std::string AppendLocked();
-  std::string AppendFiles();
+  std::string AppendTo(const fileindex::LockedQueue& queue);
+  std::string AppendFilesTo(const fileindex::LockedQueue& queue);
   void NoteOutcome(std::string reason, TimePoint now);
 
   std::string path_;

@@ -1,8 +1,12 @@
-#include "services/kovanotifyd/queues/queue_line.h"
+#include "fileindex/queue/queue_line.h"
 
 #include <algorithm>
 
-namespace ferrox::notifyd {
+#include <json/value.h>
+
+#include "common/json_util.h"
+
+namespace ferrox::fileindex {
 
 namespace {
 
@@ -20,6 +24,7 @@ void AppendEscaped(std::string& text, char c) {
   }
 }
 
+/// Appends what needs no escape piece by piece: names are looked through once and seldom need any.
 void AppendText(std::string& text, std::string_view value) {
   while (true) {
     const auto special = std::find_if(value.begin(), value.end(), NeedsEscape);
@@ -33,8 +38,17 @@ void AppendText(std::string& text, std::string_view value) {
 
 }  // namespace
 
-void AppendQueueLine(std::string& text, uint32_t event, bool is_folder, std::string_view path,
-                     std::string_view path_old) {
+std::string CustomEventLine(int event, const std::string& path, const std::string& path_old, const Json::Value& data) {
+  Json::Value line(Json::objectValue);
+  line["event"] = event;
+  line["path"] = path;
+  line["path_old"] = path_old;
+  line["data"] = data;
+  return toString(line) + "\n";
+}
+
+void AppendChangeLine(std::string& text, uint32_t event, bool is_folder, std::string_view path,
+                      std::string_view path_old) {
   text += "{\"event\":";
   text += std::to_string(event);
   text += is_folder ? ",\"is_dir\":true,\"path\":\"" : ",\"is_dir\":false,\"path\":\"";
@@ -45,13 +59,14 @@ void AppendQueueLine(std::string& text, uint32_t event, bool is_folder, std::str
 }
 
 void AppendFilesLine(std::string& text, std::string_view folder, const std::set<uint64_t>& files) {
-  AppendQueueLine(text, 0, true, folder, "");
+  AppendChangeLine(text, 0, true, folder, "");
+  // The data of any other line is null: here the numbers take its place.
   constexpr std::string_view kEnd = "null}\n";
   text.resize(text.size() - kEnd.size());
-  text += "{\"files\":[";
+  text.append("{\"").append(kFilesMember).append("\":[");
   for (const uint64_t file : files) text += std::to_string(file) + ",";
   text.back() = ']';
   text += "}}\n";
 }
 
-}  // namespace ferrox::notifyd
+}  // namespace ferrox::fileindex
