@@ -8,8 +8,8 @@ namespace {
 
 using std::chrono::steady_clock;
 
-/// What is very much is left to the queue's own pass.
-constexpr size_t kFilesMax = 20000;
+/// With more early writes than this, the follower stops: the next pass writes the other files. Bounds memory.
+constexpr size_t kEarlyWritesMax = 20000;
 
 }  // namespace
 
@@ -27,15 +27,15 @@ void ChangeFollower::Start() {
 
 void ChangeFollower::Stop() {
   {
-    const std::lock_guard lock(mutex_);
+    const base::MutexLock lock(mutex_);
     stopping_ = true;
   }
-  stop_changed_.notify_all();
+  stop_changed_.NotifyAll();
   if (thread_.joinable()) thread_.join();
 }
 
-void ChangeFollower::Check() {
-  const std::lock_guard lock(mutex_);
+void ChangeFollower::ThrowIfFailed() {
+  const base::MutexLock lock(mutex_);
   if (failure_) std::rethrow_exception(failure_);
 }
 
@@ -43,22 +43,24 @@ void ChangeFollower::Follow() {
   const InterruptionScope scope(context_.interruption);
   try {
     auto took = steady_clock::duration::zero();
-    while (WaitForNextLook(took) && written_.size() <= kFilesMax) {
+    while (WaitForNextRead(took) && early_writes_.size() <= kEarlyWritesMax) {
       const auto begin = steady_clock::now();
       WriteChangedFiles();
       took = steady_clock::now() - begin;
     }
   } catch (...) {
-    const std::lock_guard lock(mutex_);
+    const base::MutexLock lock(mutex_);
     failure_ = std::current_exception();
   }
 }
 
-/// Half of the time at most goes into changes, however many there are. @return false when it is to stop.
-bool ChangeFollower::WaitForNextLook(steady_clock::duration last_took) {
-  std::unique_lock lock(mutex_);
-  const auto wait = std::max<steady_clock::duration>(context_.interval, last_took);
-  return !stop_changed_.wait_for(lock, wait, [this] { return stopping_; });
+/// Waits at least as long as the last read and its writes took, so that at most half of the time goes into early
+/// writes, however many changes there are. @return false when the follower is to stop.
+bool ChangeFollower::WaitForNextRead(steady_clock::duration last_took) {
+  const auto end = steady_clock::now() + std::max<steady_clock::duration>(context_.interval, last_took);
+  const base::MutexLock lock(mutex_);
+  while (!stopping_ && steady_clock::now() < end) (void)stop_changed_.WaitUntil(mutex_, end);
+  return !stopping_;
 }
 
 void ChangeFollower::WriteChangedFiles() {
@@ -66,7 +68,7 @@ void ChangeFollower::WriteChangedFiles() {
   bool any = false;
   for (const std::string& path : tail_.NextChangedFiles()) {
     if (LookAt(path, status) != Presence::kThere || !rules_.CanBeIndexed(path)) continue;
-    written_.insert(path);
+    early_writes_.insert(path);
     tasks_.Submit([this, path] { context_.writer.Write(path); });
     any = true;
   }

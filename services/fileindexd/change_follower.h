@@ -1,13 +1,12 @@
 #pragma once
 
 #include <chrono>
-#include <condition_variable>
 #include <exception>
-#include <mutex>
 #include <set>
 #include <string>
 #include <thread>
 
+#include "base/mutex.h"
 #include "services/fileindexd/document_writer.h"
 #include "services/fileindexd/interruption.h"
 #include "services/fileindexd/path_rules.h"
@@ -16,51 +15,51 @@
 
 namespace ferrox::indexd {
 
-/// While a long pass goes on, writes files that the live queue calls changed, so that they are found soon, however slow
-/// the pass's own files are to read. Only that: their lines stay in the queue, whose pass carries them out again in its
-/// turn and decides, so that it does not matter what the present pass knew of these files.
+/// Early writes: while a long pass works on the detached queue, a thread of this class reads the live queue and writes
+/// the files that it calls new or changed, so that they are found soon, however slow the pass's own files are to read.
+/// It only writes documents and takes nothing from the queue: the pass that gets those lines carries them out again and
+/// decides, so it does not matter which folders and places the present pass knew of these files.
 class ChangeFollower {
  public:
   struct Context {
     const std::string& share;
-    const std::string& root;
+    const std::string& root;  ///< the share's folder
     const ShareFolders& folders;
     const std::string& queue_path;
     DocumentWriter& writer;
     TaskPool& pool;
     const Interruption& interruption;
-    std::chrono::milliseconds interval;  ///< from one look at the queue to the next, at least
+    std::chrono::milliseconds interval;  ///< from one read of the queue to the next, at least
   };
 
-  /// All in `context` outlives it. Begins with Start.
+  /// All that `context` refers to outlives the follower. Does nothing before Start.
   explicit ChangeFollower(const Context& context);
   ChangeFollower(const ChangeFollower&) = delete;
   ChangeFollower& operator=(const ChangeFollower&) = delete;
-  /// Like Stop.
   ~ChangeFollower() { Stop(); }
 
   void Start();
-  /// Returns when what has begun is done.
+  /// Blocks until the writes that have begun are done. May be called again, and without a Start.
   void Stop();
-  /// @throws what ended its work: then what it wrote, or others beside it, may not be in the index.
-  void Check();
-  /// The files that it wrote. Once it is stopped.
-  const std::set<std::string>& Written() const { return written_; }
+  /// @throws what ended the follower's thread: then a write, its own or one that it committed, may be missing.
+  void ThrowIfFailed();
+  /// The files that it wrote. Only after Stop.
+  const std::set<std::string>& EarlyWrites() const { return early_writes_; }
 
  private:
   void Follow();
-  bool WaitForNextLook(std::chrono::steady_clock::duration last_took);
+  bool WaitForNextRead(std::chrono::steady_clock::duration last_took);
   void WriteChangedFiles();
 
   const Context context_;
   PathRules rules_;
   TaskGroup tasks_;
   QueueTail tail_;
-  std::set<std::string> written_;
-  std::mutex mutex_;
-  std::condition_variable stop_changed_;
-  bool stopping_ = false;
-  std::exception_ptr failure_;
+  std::set<std::string> early_writes_;  ///< the thread's, until it has ended
+  base::Mutex mutex_;
+  base::ConditionVariable stop_changed_;
+  bool stopping_ BASE_GUARDED_BY(mutex_) = false;
+  std::exception_ptr failure_ BASE_GUARDED_BY(mutex_);
   std::thread thread_;
 };
 

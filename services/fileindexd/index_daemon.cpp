@@ -118,7 +118,7 @@ void IndexDaemon::Follow() {
     configuration_.Wait(configuration_.SeesChanges() ? kSlowTimer : kSlowTimerWithoutWatch);
     if (stopping_) return;
     Reconcile();
-    workers_.LookAtIndices(SharesBeingRebuilt());
+    workers_.CheckIndices(SharesBeingRebuilt());
   }
 }
 

@@ -87,7 +87,7 @@ void OperationRunner::Run(const std::function<void(const std::function<void(cons
   if (took_along) CompareOnce(context_.root);
   tasks_.Wait();
   StopFollowing();
-  follower_.Check();
+  follower_.ThrowIfFailed();
   LookAtWrittenAhead();
   RefreshChangedFiles();
   RefreshSuspects();
@@ -141,7 +141,7 @@ void OperationRunner::CheckRoot() const {
 
 /// What has been written becomes searchable and safe while a long pass goes on.
 void OperationRunner::CommitIfDue() {
-  follower_.Check();
+  follower_.ThrowIfFailed();
   if (!writer_.HasUncommitted() || std::chrono::steady_clock::now() - last_commit_ < kCommitInterval) return;
   Commit();
 }
@@ -154,12 +154,12 @@ void OperationRunner::LookAtWrittenAhead() {
     if (LookAt(path, status) == Presence::kGone) gone_.Add(path);
   }
   gone_.Flush();
-  context_.written_ahead = follower_.Written();
+  context_.written_ahead = follower_.EarlyWrites();
 }
 
 void OperationRunner::StopFollowing() {
   follower_.Stop();
-  context_.written_ahead.insert(follower_.Written().begin(), follower_.Written().end());
+  context_.written_ahead.insert(follower_.EarlyWrites().begin(), follower_.EarlyWrites().end());
 }
 
 void OperationRunner::Commit() {

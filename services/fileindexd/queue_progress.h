@@ -1,31 +1,32 @@
 #pragma once
 
 #include <chrono>
-#include <condition_variable>
 #include <cstdint>
-#include <mutex>
 #include <string>
+
+#include "base/mutex.h"
 
 namespace ferrox::indexd {
 
-/// How far a worker is with its queue, for others who wait until what was queued when they asked is in the index. Every
-/// call is safe from any thread.
+/// Requests to have in the index what is queued now (the "sync" command), and how far a share's worker is with them.
+/// Requests are numbered upwards from 1, and an outcome counts for its request and all before it. Every call is safe
+/// from any thread; only Wait blocks.
 class QueueProgress {
  public:
   using TimePoint = std::chrono::steady_clock::time_point;
 
-  /// A request that what is queued by now be carried out; later requests have higher numbers.
-  uint64_t Ask();
-  /// The requests that work begun from now on serves: all up to this one.
-  uint64_t Asked() const;
-  /// Whether a request waits for the work to come.
-  bool IsAwaited() const;
+  /// Makes a request. @return its number.
+  uint64_t Add();
+  /// The last request made: work that begins after this call serves all requests up to it.
+  uint64_t Last() const;
+  /// Whether a request has no outcome yet.
+  bool HasPending() const;
 
-  /// What was queued at the request, and at all before it, is in the index.
+  /// What was queued at the request is in the index.
   void Done(uint64_t request);
-  /// The work for the request, and for all before it, cannot be done now.
+  /// The work for the request cannot be done now. A later Done counts again.
   void Failed(uint64_t request, const std::string& reason);
-  /// No work comes any more: ends every wait, also those to come.
+  /// The worker ends: every wait, also those to come, fails with the reason unless its request is done.
   void End(const std::string& reason);
 
   enum class Result { kDone, kFailed, kTimeout };
@@ -33,13 +34,15 @@ class QueueProgress {
   Result Wait(uint64_t request, TimePoint end, std::string& reason);
 
  private:
-  mutable std::mutex mutex_;
-  std::condition_variable changed_;
-  uint64_t asked_ = 0;
-  uint64_t done_ = 0;
-  uint64_t failed_ = 0;
-  std::string reason_;
-  bool ended_ = false;
+  bool IsDecided(uint64_t request) const BASE_REQUIRES(mutex_);
+
+  mutable base::Mutex mutex_;
+  base::ConditionVariable changed_;
+  uint64_t last_ BASE_GUARDED_BY(mutex_) = 0;
+  uint64_t done_ BASE_GUARDED_BY(mutex_) = 0;
+  uint64_t failed_ BASE_GUARDED_BY(mutex_) = 0;
+  std::string reason_ BASE_GUARDED_BY(mutex_);  ///< of the last failure, or of the end
+  bool ended_ BASE_GUARDED_BY(mutex_) = false;
 };
 
 }  // namespace ferrox::indexd

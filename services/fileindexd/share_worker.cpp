@@ -148,7 +148,7 @@ void ShareWorker::Wake() {
   watch_.Wake();
 }
 
-void ShareWorker::NoteInner(const std::vector<std::string>& folders) {
+void ShareWorker::SetInnerShares(const std::vector<std::string>& folders) {
   if (noted_inner_ == folders) return;
   const bool is_change = noted_inner_.has_value();
   noted_inner_ = folders;
@@ -157,14 +157,14 @@ void ShareWorker::NoteInner(const std::vector<std::string>& folders) {
   Wake();
 }
 
-void ShareWorker::LookAtIndex() {
+void ShareWorker::CheckIndex() {
   look_at_index_ = true;
   Wake();
 }
 
 uint64_t ShareWorker::RequestSync() {
   if (NothingWaits()) return 0;
-  const uint64_t request = progress_.Ask();
+  const uint64_t request = progress_.Add();
   Wake();
   return request;
 }
@@ -200,7 +200,7 @@ void ShareWorker::Loop() {
   while (!stopping_) {
     if (environment_.pause.Paused()) {
       status_.SetState(ShareStatus::State::kPaused);
-      progress_.Failed(progress_.Asked(), "indexing is paused; 'fileindexctl resume' resumes it");
+      progress_.Failed(progress_.Last(), "indexing is paused; 'fileindexctl resume' resumes it");
       watch_.WaitForWake(environment_.pause.Left());
       continue;
     }
@@ -219,7 +219,7 @@ void ShareWorker::Loop() {
 milliseconds ShareWorker::Round() {
   settled_ = false;
   inner_changes_seen_ = inner_changes_.load();
-  serves_ = progress_.Asked();
+  serves_ = progress_.Last();
   try {
     RunOnce();
     delay_ = milliseconds(0);
@@ -344,7 +344,7 @@ void ShareWorker::RunOnce() {
   const bool is_queued = HasContent(queue_path_) || IsFileExist(detached);
   if (!is_queued && folders.DiffersInInnerAlone(applied_.Get())) (void)Queue(kPassEvent, root_);
   do {
-    serves_ = progress_.Asked();
+    serves_ = progress_.Last();
     QueueNeededReindex();
     const bool begun_before = IsFileExist(detached);
     if (!begun_before && !HasContent(queue_path_)) break;
@@ -359,9 +359,9 @@ void ShareWorker::RunOnce() {
 /// waits for the queue waits for that.
 void ShareWorker::Gather() {
   const auto left = std::chrono::ceil<milliseconds>(last_pass_end_ + environment_.gather_time - steady_clock::now());
-  if (left.count() > 0 && !progress_.IsAwaited()) watch_.WaitForWake(left);
+  if (left.count() > 0 && !progress_.HasPending()) watch_.WaitForWake(left);
   interruption_.Check();
-  serves_ = progress_.Asked();
+  serves_ = progress_.Last();
 }
 
 void ShareWorker::CheckShare() {
@@ -528,7 +528,7 @@ void ShareWorker::RunOperations(fileindex::QueueMgr& queue, OperationRunner& run
 
 ShareFolders ShareWorker::LoadFolders() {
   ShareFolders folders = ShareFolders::Load(share_, root_);
-  const std::lock_guard lock(shown_mutex_);
+  const base::MutexLock lock(shown_mutex_);
   shown_ = std::make_shared<const ShareFolders>(folders);
   return folders;
 }
@@ -549,7 +549,7 @@ bool ShareWorker::AreStill(const ShareFolders& folders) {
 }
 
 std::shared_ptr<const ShareFolders> ShareWorker::Shown() {
-  const std::lock_guard lock(shown_mutex_);
+  const base::MutexLock lock(shown_mutex_);
   return shown_;
 }
 
@@ -609,7 +609,7 @@ Json::Value ShareWorker::Status(std::chrono::milliseconds engine_wait) {
   json["index"] = index_->Figures(engine_wait);
   const Json::Value& index = json["index"];
   if (index.isObject() && index.isMember("rebuilding") && index["rebuilding"]["since"] != Json::Int64(rebuilding_)) {
-    LookAtIndex();
+    CheckIndex();
   }
   return json;
 }

@@ -6,7 +6,6 @@
 #include <functional>
 #include <future>
 #include <memory>
-#include <mutex>
 #include <optional>
 #include <set>
 #include <string>
@@ -15,6 +14,7 @@
 
 #include <json/value.h>
 
+#include "base/mutex.h"
 #include "common/error.h"
 #include "services/fileindexd/applied_folders.h"
 #include "services/fileindexd/file_watch.h"
@@ -91,9 +91,9 @@ class ShareWorker {
 
   /// Which indexed shares lie in this one now; what changes in that is carried out at once. From any thread, one at a
   /// time.
-  void NoteInner(const std::vector<std::string>& folders);
+  void SetInnerShares(const std::vector<std::string>& folders);
   /// Looks whether the engine has made the index anew, and fills it then. From any thread.
-  void LookAtIndex();
+  void CheckIndex();
 
   /// Asks that all that is queued now be in the index soon. @return what AwaitSync waits for; 0 when nothing is to be
   /// done. Like AwaitSync, from any thread.
@@ -161,9 +161,9 @@ class ShareWorker {
   AppliedFolders applied_;
   std::optional<std::chrono::steady_clock::time_point> awaits_since_;
   std::set<std::string> written_ahead_;
-  std::mutex shown_mutex_;
-  std::shared_ptr<const ShareFolders> shown_;            ///< those last loaded, for the status
-  std::optional<std::vector<std::string>> noted_inner_;  ///< NoteInner's own
+  base::Mutex shown_mutex_;
+  std::shared_ptr<const ShareFolders> shown_ BASE_GUARDED_BY(shown_mutex_);  ///< those last loaded, for the status
+  std::optional<std::vector<std::string>> noted_inner_;                      ///< SetInnerShares's own
   std::atomic<uint64_t> inner_changes_{0};
   std::atomic<uint64_t> inner_changes_seen_{0};  ///< when the present or last round began
   int last_failure_ = 0;

@@ -8,61 +8,66 @@ namespace ferrox::indexd {
 
 namespace {
 
-constexpr size_t kWaitingPerThread = 8;
+using std::chrono::steady_clock;
+
+constexpr size_t kUnfinishedPerThread = 8;
 constexpr unsigned kThreadsForUrgent = 2;
-constexpr std::chrono::milliseconds kLookForInterruption{100};
+/// An Interruption wakes sleeps and socket waits, but not those for a group's tasks: these check it at this interval.
+constexpr std::chrono::milliseconds kInterruptionPoll{100};
 
 }  // namespace
 
-TaskPool::TaskPool(unsigned threads) : unhurried_max_(std::max(threads, 2U)) {
-  for (unsigned i = 0; i < unhurried_max_ + kThreadsForUrgent; ++i) threads_.emplace_back([this] { Work(); });
+TaskPool::TaskPool(unsigned threads) : normal_max_(std::max(threads, 2U)) {
+  for (unsigned i = 0; i < normal_max_ + kThreadsForUrgent; ++i) threads_.emplace_back([this] { Work(); });
 }
 
 TaskPool::~TaskPool() {
   {
-    const std::lock_guard lock(mutex_);
+    const base::MutexLock lock(mutex_);
     stopping_ = true;
   }
-  job_ready_.notify_all();
+  job_ready_.NotifyAll();
   for (std::thread& thread : threads_) thread.join();
 }
 
 void TaskPool::Add(Job job) {
   {
-    const std::lock_guard lock(mutex_);
-    (job.urgent ? urgent_ : unhurried_).push_back(std::move(job));
+    const base::MutexLock lock(mutex_);
+    (job.urgent ? urgent_ : normal_).push_back(std::move(job));
   }
-  job_ready_.notify_one();
+  job_ready_.NotifyOne();
 }
 
 void TaskPool::Drop(TaskGroup& group) {
   size_t dropped = 0;
   {
-    const std::lock_guard lock(mutex_);
+    const base::MutexLock lock(mutex_);
     const auto is_its = [&group](const Job& job) { return job.group == &group; };
-    dropped = std::erase_if(urgent_, is_its) + std::erase_if(unhurried_, is_its);
+    dropped = std::erase_if(urgent_, is_its) + std::erase_if(normal_, is_its);
   }
   for (; dropped > 0; --dropped) group.Finish(std::make_exception_ptr(Interrupted()));
 }
 
+bool TaskPool::HasJob() const { return !urgent_.empty() || (!normal_.empty() && normal_running_ < normal_max_); }
+
 TaskPool::Job TaskPool::Take() {
-  std::deque<Job>& jobs = urgent_.empty() ? unhurried_ : urgent_;
+  std::deque<Job>& jobs = urgent_.empty() ? normal_ : urgent_;
   Job job = std::move(jobs.front());
   jobs.pop_front();
-  unhurried_running_ += job.urgent ? 0 : 1;
+  normal_running_ += job.urgent ? 0 : 1;
   return job;
 }
 
 void TaskPool::Work() {
-  std::unique_lock lock(mutex_);
+  base::MutexLock lock(mutex_);
   while (true) {
-    job_ready_.wait(lock, [this] { return stopping_ || HasJob(); });
+    while (!stopping_ && !HasJob()) job_ready_.Wait(mutex_);
     if (!HasJob()) return;
     Job job = Take();
-    lock.unlock();
+    lock.Unlock();
     Run(job);
-    lock.lock();
-    unhurried_running_ -= job.urgent ? 0 : 1;
+    lock.Lock();
+    normal_running_ -= job.urgent ? 0 : 1;
   }
 }
 
@@ -71,62 +76,69 @@ void TaskPool::Run(Job& job) {
   try {
     const InterruptionScope scope(job.group->interruption_);
     job.group->interruption_.Check();
-    if (!job.group->voided_.load()) job.task();
+    if (!job.group->cancelled_.load()) job.task();
   } catch (...) {
     failure = std::current_exception();
   }
   job.task = nullptr;
-  // Given away, so that the thread that waits for it is the one that frees it: the thread sanitizer cannot see more.
+  // Moved, so that the thread that waits for the failure is the one that frees it: the thread sanitizer does not see
+  // the reference count of exceptions.
   job.group->Finish(std::move(failure));
 }
 
 TaskGroup::~TaskGroup() {
-  voided_ = true;
-  std::unique_lock lock(mutex_);
-  Await(lock, [this] { return unfinished_ == 0; });
+  cancelled_ = true;
+  const base::MutexLock lock(mutex_);
+  AwaitAtMost(0, false);
 }
 
-template <typename IsOver>
-void TaskGroup::Await(std::unique_lock<std::mutex>& lock, const IsOver& is_over) {
-  while (!done_.wait_for(lock, kLookForInterruption, is_over)) {
-    if (!voided_ && !interruption_.Requested()) continue;
-    lock.unlock();
+/// Waits until no more tasks than these are unfinished, or, where asked for, one has failed. Once the group is
+/// interrupted or cancelled, its tasks that have not begun are dropped: another group's tasks may hold the threads for
+/// long.
+void TaskGroup::AwaitAtMost(size_t unfinished, bool until_failure) {
+  auto next_check = steady_clock::now() + kInterruptionPoll;
+  while (unfinished_ > unfinished && !(until_failure && failure_)) {
+    if (finished_.WaitUntil(mutex_, next_check)) continue;
+    next_check = steady_clock::now() + kInterruptionPoll;
+    if (!cancelled_ && !interruption_.Requested()) continue;
+    mutex_.Unlock();
     pool_.Drop(*this);
-    lock.lock();
+    mutex_.Lock();
   }
 }
 
 void TaskGroup::Submit(std::function<void()> task) {
   interruption_.Check();
   {
-    std::unique_lock lock(mutex_);
-    Await(lock, [this] { return unfinished_ < kWaitingPerThread * pool_.Threads() || failure_; });
-    RethrowFailure(lock);
+    const base::MutexLock lock(mutex_);
+    AwaitAtMost(kUnfinishedPerThread * pool_.Threads() - 1, true);
+    RethrowFailure();
     ++unfinished_;
   }
   pool_.Add({this, urgent_, std::move(task)});
 }
 
 void TaskGroup::Wait() {
-  std::unique_lock lock(mutex_);
-  Await(lock, [this] { return unfinished_ == 0; });
-  RethrowFailure(lock);
+  const base::MutexLock lock(mutex_);
+  AwaitAtMost(0, false);
+  RethrowFailure();
 }
 
 void TaskGroup::Finish(std::exception_ptr failure) {
-  const std::lock_guard lock(mutex_);
+  const base::MutexLock lock(mutex_);
   if (failure && !failure_) {
     failure_ = std::move(failure);
-    voided_ = true;
+    cancelled_ = true;
   }
   --unfinished_;
-  // Under the lock: the group may be gone as soon as its owner can see that nothing is left.
-  done_.notify_all();
+  // Under the lock: the owner may destroy the group as soon as it can see that nothing is unfinished.
+  finished_.NotifyAll();
 }
 
-void TaskGroup::RethrowFailure(std::unique_lock<std::mutex>& lock) {
+/// Not before the group's other tasks have ended: they use what the owner frees next.
+void TaskGroup::RethrowFailure() {
   if (!failure_) return;
-  Await(lock, [this] { return unfinished_ == 0; });
+  AwaitAtMost(0, false);
   std::rethrow_exception(failure_);
 }
 

@@ -4,19 +4,15 @@
 
 #include <algorithm>
 #include <chrono>
-#include <set>
 
 #include "common/error.h"
-#include "common/file_util.h"
 #include "common/log.h"
-#include "fileindex/folders/folder_mgr.h"
-#include "sdk/share.h"
 
 namespace ferrox::indexd {
 
 namespace {
 
-/// What a worker does besides asking other daemons takes no longer, unless a file system hangs.
+/// A worker ends within this time, its waits for other daemons cut, unless a file system hangs.
 constexpr std::chrono::seconds kEndPatience(10);
 
 }  // namespace
@@ -26,52 +22,111 @@ WorkerSet::~WorkerSet() {
 }
 
 void WorkerSet::Reconcile() {
-  const std::lock_guard order(order_mutex_);
+  const base::MutexLock order(order_mutex_);
   ReconcileInOrder();
 }
 
 void WorkerSet::Create(const std::string& share) {
-  const std::lock_guard order(order_mutex_);
-  commanded_[share] = Command::kCreate;
+  const base::MutexLock order(order_mutex_);
+  commands_[share] = Command::kCreate;
   End(share);
   ReconcileInOrder();
 }
 
 void WorkerSet::Delete(const std::string& share) {
-  const std::lock_guard order(order_mutex_);
-  commanded_[share] = Command::kDelete;
+  const base::MutexLock order(order_mutex_);
+  commands_[share] = Command::kDelete;
   End(share);
 }
 
 void WorkerSet::SettingChanged(const std::string& share) {
-  const std::lock_guard order(order_mutex_);
-  commanded_.erase(share);
+  const base::MutexLock order(order_mutex_);
+  commands_.erase(share);
   ReconcileInOrder();
-  if (const auto worker = Find(share)) worker->LookAtIndex();
+  if (const auto worker = Find(share)) worker->CheckIndex();
+}
+
+void WorkerSet::ReconcileInOrder() {
+  const IndexedShares indexed_shares = LoadIndexedShares();
+  std::erase_if(commands_, [&](const auto& item) { return indexed_shares.count(item.first) == 0; });
+  EndUnwanted(indexed_shares);
+  MakeMissing(indexed_shares);
+  for (const auto& [share, worker] : Present()) worker->SetInnerShares(InnerRoots(indexed_shares, worker->Root()));
+}
+
+void WorkerSet::EndUnwanted(const IndexedShares& indexed_shares) {
+  for (const auto& [share, worker] : Present()) {
+    const auto indexed = indexed_shares.find(share);
+    const bool usable = indexed != indexed_shares.end() && indexed->second.root == worker->Root();
+    if (usable && ShouldRun(share, indexed->second) && !worker->IsStopping()) continue;
+    try {
+      End(share);
+      if (!usable) worker->Forget();
+    } catch (const Error&) {
+      // Logged; the next reconciliation tries again.
+    }
+  }
+}
+
+void WorkerSet::MakeMissing(const IndexedShares& indexed_shares) {
+  const Workers present = Present();
+  for (const auto& [share, indexed] : indexed_shares) {
+    if (present.count(share) != 0 || !ShouldRun(share, indexed)) continue;
+    try {
+      std::shared_ptr<ShareWorker> made = make_(share);
+      made->Start();
+      const base::MutexLock lock(mutex_);
+      workers_[share] = std::move(made);
+    } catch (const Error& error) {
+      Log(LOG_ERR, "share %s gets no worker for now: %s", share.c_str(), error.what());
+    }
+  }
+}
+
+/// A command holds until the folders say the same.
+bool WorkerSet::ShouldRun(const std::string& share, const IndexedShare& indexed) {
+  const auto command = commands_.find(share);
+  if (command == commands_.end()) return !indexed.all_paused;
+  const bool wanted = command->second == Command::kCreate;
+  if (wanted == !indexed.all_paused) commands_.erase(command);
+  return wanted;
+}
+
+/// A worker that hangs stays in the set, since no other may work on its queue, and is waited for only once.
+void WorkerSet::End(const std::string& share) {
+  const auto worker = Find(share);
+  if (worker == nullptr) return;
+  const bool ended = worker->StopWithin(worker->IsStopping() ? std::chrono::seconds(0) : kEndPatience);
+  FERROX_FAIL_IF(!ended, Error::kInternal,
+                 "the worker of share " + share + " does not end: its file system may hang; look at " + worker->Root());
+  const base::MutexLock lock(mutex_);
+  read_by_ended_ += worker->FilesRead();
+  workers_.erase(share);
 }
 
 void WorkerSet::WakeAll() {
   for (const auto& [share, worker] : Present()) worker->Wake();
 }
 
-void WorkerSet::LookAtIndices(const std::vector<std::string>& shares) const {
+void WorkerSet::CheckIndices(const std::vector<std::string>& shares) const {
   for (const std::string& share : shares) {
-    if (const auto worker = Find(share)) worker->LookAtIndex();
+    if (const auto worker = Find(share)) worker->CheckIndex();
   }
 }
 
+/// A copy, for what takes longer than the mutex may be held.
 WorkerSet::Workers WorkerSet::Present() const {
-  const std::lock_guard lock(mutex_);
+  const base::MutexLock lock(mutex_);
   return workers_;
 }
 
 std::shared_ptr<ShareWorker> WorkerSet::Find(const std::string& share) const {
-  const std::lock_guard lock(mutex_);
+  const base::MutexLock lock(mutex_);
   const auto found = workers_.find(share);
   return found != workers_.end() ? found->second : nullptr;
 }
 
-/// All are asked before the first is waited for.
+/// All requests are made before the first is waited for, so that the shares are worked on beside each other.
 std::string WorkerSet::Sync(const std::vector<std::string>& shares, QueueProgress::TimePoint end) const {
   Workers workers = Present();
   std::string problems;
@@ -98,8 +153,8 @@ void WorkerSet::EndSyncs(const std::string& reason) const {
   for (const auto& [share, worker] : Present()) worker->EndSyncs(reason);
 }
 
-/// The engine, which is asked for each worker, may be slow; commands do not wait for it. One that hangs costs the wait
-/// once, however many shares there are.
+/// Each worker asks the engine. All share one deadline, so that an engine that hangs costs the wait once, however many
+/// shares there are.
 Json::Value WorkerSet::Status() const {
   using std::chrono::milliseconds;
   const auto end = std::chrono::steady_clock::now() + ShareWorker::kEngineWait;
@@ -112,84 +167,10 @@ Json::Value WorkerSet::Status() const {
 }
 
 uint64_t WorkerSet::FilesRead() const {
-  const std::lock_guard lock(mutex_);
+  const base::MutexLock lock(mutex_);
   uint64_t files = read_by_ended_;
   for (const auto& [share, worker] : workers_) files += worker->FilesRead();
   return files;
-}
-
-/// Somebody may be asking the worker for its status, so that it is not gone when it is out of the set. One that hangs
-/// stays in it: no other may work on its queue. It is waited for once only.
-void WorkerSet::End(const std::string& share) {
-  const auto worker = Find(share);
-  if (worker == nullptr) return;
-  const bool ended = worker->StopWithin(worker->IsStopping() ? std::chrono::seconds(0) : kEndPatience);
-  FERROX_FAIL_IF(!ended, Error::kInternal,
-                 "the worker of share " + share + " does not end: its file system may hang; look at " + worker->Root());
-  const std::lock_guard lock(mutex_);
-  read_by_ended_ += worker->FilesRead();
-  workers_.erase(share);
-}
-
-std::map<std::string, WorkerSet::IndexedShare> WorkerSet::IndexedShares() {
-  const fileindex::FolderMgr folder_mgr;
-  // All at once: a share table that cannot be read must not look like one without shares.
-  const std::vector<std::string> names = sdk::SDKShare::Enum();
-  const std::set<std::string> existing(names.begin(), names.end());
-  std::map<std::string, IndexedShare> shares;
-  for (const auto& folder : folder_mgr.GetFolders()) {
-    if (folder->GetPath().empty() || folder->GetPath().front() != '/') continue;
-    const std::string share = folder->GetShare();
-    if (existing.count(share) == 0) continue;
-    IndexedShare& indexed = shares[share];
-    indexed.all_paused = indexed.all_paused && folder->IsPaused();
-  }
-  for (auto& [share, indexed] : shares) indexed.root = sdk::SDKShare(share).GetPath();
-  return shares;
-}
-
-void WorkerSet::ReconcileInOrder() {
-  const std::map<std::string, IndexedShare> indexed_shares = IndexedShares();
-  std::erase_if(commanded_, [&](const auto& item) { return indexed_shares.count(item.first) == 0; });
-  for (const auto& [share, worker] : Present()) {
-    const auto indexed = indexed_shares.find(share);
-    const bool usable = indexed != indexed_shares.end() && indexed->second.root == worker->Root();
-    if (usable && Wants(share, indexed->second) && !worker->IsStopping()) continue;
-    try {
-      End(share);
-      if (!usable) worker->Forget();
-    } catch (const Error&) {
-      // Logged; looked at again with the next change, or after a while.
-    }
-  }
-  const Workers present = Present();
-  for (const auto& [share, indexed] : indexed_shares) {
-    if (present.count(share) != 0 || !Wants(share, indexed)) continue;
-    try {
-      std::shared_ptr<ShareWorker> made = make_(share);
-      made->Start();
-      const std::lock_guard lock(mutex_);
-      workers_[share] = std::move(made);
-    } catch (const Error& error) {
-      Log(LOG_ERR, "share %s gets no worker for now: %s", share.c_str(), error.what());
-    }
-  }
-  for (const auto& [share, worker] : Present()) {
-    std::vector<std::string> inner;
-    for (const auto& [name, other] : indexed_shares) {
-      if (StringStartWith(other.root, worker->Root() + "/")) inner.push_back(other.root);
-    }
-    worker->NoteInner(inner);
-  }
-}
-
-/// A command holds until the folders say the same.
-bool WorkerSet::Wants(const std::string& share, const IndexedShare& indexed) {
-  const auto command = commanded_.find(share);
-  if (command == commanded_.end()) return !indexed.all_paused;
-  const bool wanted = command->second == Command::kCreate;
-  if (wanted == !indexed.all_paused) commanded_.erase(command);
-  return wanted;
 }
 
 }  // namespace ferrox::indexd

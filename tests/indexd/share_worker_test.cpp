@@ -269,7 +269,7 @@ TEST_F(ShareWorkerTest, AnIndexThatWasMadeAnewIsFilledAndSaidToBeComplete) {
     index->before_write = [&](const std::string&) {
       if (!std::exchange(met, true)) index->rebuilding = 2;  // once more, unseen by what is under way
     };
-    worker->LookAtIndex();
+    worker->CheckIndex();
     worker->RunOnce();
     EXPECT_EQ(Expected(), Indexed());
     EXPECT_EQ(again ? 0 : 2, index->rebuilding) << "of another one nothing is said yet";
