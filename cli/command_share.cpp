@@ -4,6 +4,7 @@
 #include <set>
 #include <string>
 
+#include "base/path.h"
 #include "cli/ask.h"
 #include "cli/command_table.h"
 #include "cli/configuration_change.h"
@@ -47,9 +48,9 @@ std::string OuterOf(const std::string& path) {
   std::string outer;
   size_t depth = 0;
   for (const auto& share : kova::host::ListShares()) {
-    if (share.path.size() <= depth || !StringStartWith(path, share.path + "/")) continue;
+    if (share.path.size() <= depth || !base::IsBelow(path, share.path)) continue;
     for (const Json::Value& folder : FoldersOf(share.name)) {
-      if (!StringStartWith(path + "/", Dirname(share.path) + folder.asString() + "/")) continue;
+      if (!base::IsAtOrBelow(path, Dirname(share.path) + folder.asString())) continue;
       outer = share.name;
       depth = share.path.size();
     }
@@ -122,7 +123,7 @@ void TellOfNested(const kova::host::ShareEntry& added) {
   const std::set<std::string> indexed = fileindex::FolderMgr().GetIndexedShares();
   if (indexed.count(added.name) == 0) return;
   for (const auto& share : kova::host::ListShares()) {
-    if (indexed.count(share.name) == 0 || !StringStartWith(share.path, added.path + "/")) continue;
+    if (indexed.count(share.name) == 0 || !base::IsBelow(share.path, added.path)) continue;
     (void)printf("share %s lies in it and keeps its files, which are found there alone\n",
                  EscapeForTerminal(share.name).c_str());
   }

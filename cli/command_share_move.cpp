@@ -5,6 +5,7 @@
 
 #include <kova/notifyd.h>
 
+#include "base/path.h"
 #include "cli/ask.h"
 #include "cli/command_table.h"
 #include "cli/configuration_change.h"
@@ -48,7 +49,7 @@ struct Move {
 
 void RefuseSharesBelow(const ShareEntry& entry) {
   for (const ShareEntry& other : kova::host::ListShares()) {
-    if (other.name != entry.name && StringStartWith(other.path, entry.path + "/")) {
+    if (other.name != entry.name && base::IsBelow(other.path, entry.path)) {
       throw Failure("share " + other.name + " lies in share " + entry.name +
                     "; remove it first ('fileindexctl share remove " + other.name + "'), and add it again afterwards");
     }

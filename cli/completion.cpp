@@ -6,6 +6,7 @@
 #include <cstdio>
 #include <memory>
 
+#include "base/path.h"
 #include "cli/command_table.h"
 #include "cli/folder_path.h"
 #include "cli/global_options.h"
@@ -25,7 +26,7 @@ Words FoldersBelow(const std::string& typed) {
   Words found;
   const std::string parent = typed.substr(0, typed.rfind('/'));
   for (const std::string& share : sdk::SDKShare::Enum()) {
-    if (!StringStartWith(parent + "/", "/" + share + "/")) continue;
+    if (!base::IsAtOrBelow(parent, "/" + share)) continue;
     const std::string folder = sdk::SDKShare(share).GetPath() + parent.substr(1 + share.size());
     const std::unique_ptr<DIR, int (*)(DIR*)> entries(opendir(folder.c_str()), &closedir);
     if (entries == nullptr) continue;

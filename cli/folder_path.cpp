@@ -6,6 +6,7 @@
 #include <cerrno>
 #include <vector>
 
+#include "base/path.h"
 #include "cli/command.h"
 #include "cli/own_share.h"
 #include "cli/rights.h"
@@ -34,7 +35,7 @@ std::string SharePathOnDisk(const std::string& path) {
   std::string best_folder;
   for (const std::string& name : sdk::SDKShare::Enum()) {
     const std::string folder = sdk::SDKShare(name).GetPath();
-    if (!StringStartWith(path + "/", folder + "/") || folder.size() < best_folder.size()) continue;
+    if (!base::IsAtOrBelow(path, folder) || folder.size() < best_folder.size()) continue;
     best_folder = folder;
     best = "/" + name + path.substr(folder.size());
   }

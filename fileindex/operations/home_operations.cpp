@@ -11,6 +11,7 @@
 #include <kova/recycle.h>
 #include <kova/string_list.h>
 
+#include "base/path.h"
 #include "common/log.h"
 #include "common/sdk_mutex.h"
 #include "fileindex/folders/folder_mgr.h"
@@ -93,7 +94,7 @@ void UserRename(const std::string& user_from, const std::string& user_to) {
   const std::string home_to = kHomes + user_to;
   for (const std::shared_ptr<Folder>& folder : folder_mgr.GetFolders()) {
     const std::string path = folder->GetPath();
-    if (!StringStartWith(path + "/", home_from + "/")) continue;
+    if (!base::IsAtOrBelow(path, home_from)) continue;
     folder->SetPath(home_to + path.substr(home_from.size()));
     // Deliberate: of the log's error priority.
     Log(LOG_ERR, "%s:%d Update homes rule: [%s] -> [%s]", ModuleName(FERROX_SOURCE).c_str(), __LINE__, path.c_str(),

@@ -5,6 +5,7 @@
 
 #include <json/value.h>
 
+#include "base/path.h"
 #include "common/log.h"
 #include "common/new_class.h"
 #include "fileindex/elastic/elastic_control.h"
@@ -31,11 +32,12 @@ void SetPausedOfShare(const FolderMgr& folder_mgr, const std::string& share, boo
   }
 }
 
-/// Whether the folder lies on the volume mounted there. One whose share is gone lies on none.
+/// Whether the folder lies on the volume mounted there. One whose share is gone lies on none. Deliberate: "/" is no
+/// volume, so that no request pauses or drops all folders at once.
 bool LiesOnVolume(const Folder& folder, const std::string& mount_point) {
   const bool has_share = StringStartWith(folder.GetPath(), "/");
   if (has_share && IsShareKnown(folder.GetShare()))
-    return StringStartWith(folder.GetFullPath() + "/", mount_point + "/");
+    return mount_point != "/" && base::IsAtOrBelow(folder.GetFullPath(), mount_point);
   Log(LOG_WARNING, "folder [%s] passed over, its share does not exist", folder.GetPath().c_str());
   return false;
 }

@@ -5,7 +5,7 @@
 
 #include <json/value.h>
 
-#include "common/file_util.h"
+#include "base/path.h"
 #include "fileindex/folders/folder_mgr.h"
 
 /// What the notification daemon is asked to watch for a share. Inline: of use to whoever keeps registrations in step
@@ -26,7 +26,7 @@ inline Json::Value WatchListOf(const std::string& share, const std::string& queu
   document["queue"] = queue_path;
   Json::Value& config = document["config"] = Json::Value(Json::arrayValue);
   for (const std::shared_ptr<Folder>& folder : folder_mgr.GetFolders()) {
-    if (!StringStartWith(folder->GetPath() + "/", "/" + share + "/")) continue;
+    if (!base::IsAtOrBelow(folder->GetPath(), "/" + share)) continue;
     Json::Value watch(Json::objectValue);
     watch["path"] = folder->GetFullPath();
     watch["mask"] = kWatchedChanges;

@@ -1,7 +1,7 @@
 #include <algorithm>
 
+#include "base/path.h"
 #include "common/new_class.h"
-#include "fileindex/optree/op_path.h"
 #include "fileindex/optree/optree.h"
 
 // How a rename takes what is pending under the old name along to the new one.
@@ -73,10 +73,10 @@ bool OPTree::CanAffordIdle(OPNode& old_node) {
 void OPTree::MoveBelow(OPNode& old_node, const std::string& old_path, const std::string& new_path) {
   const bool with_idle = CanAffordIdle(old_node);
   const auto move = [&](const std::shared_ptr<OPNode>& node) { MoveAlong(*node, old_path, new_path, with_idle); };
-  if (IsAtOrBelow(new_path, old_path)) {
+  if (base::IsAtOrBelow(new_path, old_path)) {
     // The nodes are listed first, or the walk would go on into those that it makes.
     for (OPNode* const node : NodesBelow(old_node, kEveryNode)) move(node->shared_from_this());
-  } else if (with_idle || IsAtOrBelow(old_path, new_path)) {
+  } else if (with_idle || base::IsAtOrBelow(old_path, new_path)) {
     // To an ancestor, an operation may come to a node that the walk has yet to pass.
     TraverseNodeDescendant(old_node.shared_from_this(), move, true);
   } else {

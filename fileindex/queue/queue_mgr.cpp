@@ -3,17 +3,26 @@
 #include <cerrno>
 #include <cstdio>
 
+#include "base/path.h"
 #include "common/file_util.h"
 #include "common/lock_file.h"
 #include "common/log.h"
 #include "common/new_class.h"
 #include "fileindex/folders/folder_mgr.h"
-#include "fileindex/optree/op_path.h"
 #include "fileindex/optree/optree.h"
 #include "fileindex/queue/event_line_reader.h"
 #include "fileindex/queue/queue_file.h"
 
 namespace ferrox::fileindex {
+
+namespace {
+
+/// Deliberate: "/" covers itself alone. No queue is the root's, and who asks for it is not stopped by every event.
+bool Covers(std::string_view folder, std::string_view path) {
+  return path == folder || (folder != "/" && base::IsAtOrBelow(path, folder));
+}
+
+}  // namespace
 
 QueueMgr::QueueMgr(const std::string& queue_path)
     : queue_path_(queue_path), queue_path_tmp_(DetachedQueuePath(queue_path)) {}
@@ -52,14 +61,14 @@ bool QueueMgr::IsFullPathProcessing(const std::string& full_path) {
   // Folders that cannot be loaded count as a failure here; otherwise they have no say.
   const FolderMgr folder_mgr;
   const auto touches = [&full_path](const std::shared_ptr<Event>& event) {
-    return IsAtOrBelow(event->path, full_path) || IsAtOrBelow(event->path_old, full_path);
+    return Covers(full_path, event->path) || Covers(full_path, event->path_old);
   };
   return FindQueues(touches);
 }
 
 bool QueueMgr::IsFullPathHasReindex(const std::string& full_path) {
   const auto covers = [&full_path](const std::shared_ptr<Event>& event) {
-    return event->event == EVENT_REINDEX && IsAtOrBelow(full_path, event->path);
+    return event->event == EVENT_REINDEX && Covers(event->path, full_path);
   };
   return FindQueues(covers);
 }

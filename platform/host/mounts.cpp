@@ -12,6 +12,7 @@
 
 #include <kova/mountinfo.h>
 
+#include "base/path.h"
 #include "platform/host/files.h"
 
 namespace kova::host {
@@ -83,7 +84,6 @@ std::string MountPointOf(std::string path) {
 }
 
 std::vector<std::string> MountsBelow(const std::string& folder) {
-  const std::string prefix = folder == "/" ? folder : folder + "/";
   std::set<std::string> points;
   std::ifstream table("/proc/self/mountinfo");
   for (std::string line; std::getline(table, line);) {
@@ -91,7 +91,7 @@ std::vector<std::string> MountsBelow(const std::string& folder) {
     std::string id, parent, device, root, point;
     if (!(fields >> id >> parent >> device >> root >> point)) continue;
     point = PlainMountField(point);
-    if (point.size() > prefix.size() && point.compare(0, prefix.size(), prefix) == 0) points.insert(point);
+    if (base::IsBelow(point, folder)) points.insert(point);
   }
   return {points.begin(), points.end()};
 }

@@ -11,8 +11,8 @@
 #include <kova/fs.h>
 #include <kova/instance.h>
 
+#include "base/path.h"
 #include "platform/host/files.h"
-#include "platform/shared/path_match.h"
 
 namespace kova::host {
 
@@ -82,7 +82,7 @@ std::string ShareFolderProblem(const ShareEntry& share) {
   if (KOVAGetFSType(share.path.c_str(), 0) == KOVA_FS_PSEUDO) {
     return share.path + " is the system's own and holds no files of users; choose another folder";
   }
-  if (IsAtOrBelow(share.path, InstanceRoot() + "/var/lib/kova")) {
+  if (base::IsAtOrBelow(share.path, InstanceRoot() + "/var/lib/kova")) {
     return share.path + " holds the index's own files and cannot be a share; choose another folder";
   }
   return {};

@@ -4,8 +4,8 @@
 
 #include <kova/content_extract.h>
 
+#include "base/path.h"
 #include "common/error.h"
-#include "common/file_util.h"
 
 namespace ferrox::indexd {
 
@@ -18,10 +18,6 @@ namespace {
 constexpr unsigned kMovedAtOnce = 20000;
 /// Documents of which one may tell where a folder was: others may have been deleted or replaced since.
 constexpr unsigned kLookedAt = 1000;
-
-bool IsAtOrBelow(const std::string& path, const std::string& folder) {
-  return StringStartWith(path + "/", folder + "/");
-}
 
 bool IsFolder(const std::string& path) {
   struct stat status = {};
@@ -41,7 +37,7 @@ std::vector<std::string> EntriesOf(const std::string& folder) {
 
 std::vector<DocumentMover::Step> DocumentMover::StepsOf(const std::string& path, const std::string& old_path) {
   std::vector<Step> steps;
-  if (IsAtOrBelow(path, old_path) || IsAtOrBelow(old_path, path)) return steps;
+  if (base::IsAtOrBelow(path, old_path) || base::IsAtOrBelow(old_path, path)) return steps;
   for (const std::string& top : IndexedTopsOf(path)) steps.push_back({top, old_path + top.substr(path.size())});
   return steps;
 }

@@ -2,7 +2,7 @@
 
 #include <set>
 
-#include "common/file_util.h"
+#include "base/path.h"
 #include "fileindex/folders/folder_mgr.h"
 #include "sdk/share.h"
 
@@ -28,7 +28,7 @@ IndexedShares LoadIndexedShares() {
 std::vector<std::string> InnerRoots(const IndexedShares& shares, const std::string& root) {
   std::vector<std::string> inner;
   for (const auto& [name, share] : shares) {
-    if (StringStartWith(share.root, root + "/")) inner.push_back(share.root);
+    if (base::IsBelow(share.root, root)) inner.push_back(share.root);
   }
   return inner;
 }

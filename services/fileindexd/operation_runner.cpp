@@ -8,9 +8,9 @@
 #include <cstring>
 #include <memory>
 
+#include "base/path.h"
 #include "base/unique_fd.h"
 #include "common/error.h"
-#include "common/file_util.h"
 #include "common/log.h"
 #include "services/fileindexd/file_count.h"
 #include "services/fileindexd/queue_tail.h"
@@ -97,7 +97,7 @@ void OperationRunner::Run(const std::function<void(const std::function<void(cons
 void OperationRunner::CarryOut(const fileindex::OP& op, Stage stage) {
   context_.interruption.Check();
   const std::string path = op.node->GetPath();
-  const bool ours = path == context_.root || StringStartWith(path, context_.root + "/");
+  const bool ours = base::IsAtOrBelow(path, context_.root);
   if (!ours && op.op != fileindex::OP_FULL_REINDEX) {
     if (stage == Stage::kMove) {
       Log(LOG_WARNING, "queue of share %s: %s lies outside of it", context_.share.c_str(), path.c_str());
@@ -249,7 +249,7 @@ void OperationRunner::LookRename(const std::string& path, const std::string& old
   const bool wanted = path != context_.root && rules_.CanBeIndexed(path);
   const bool is_file = wanted && LookAt(path, status) == Presence::kThere && !S_ISDIR(status.st_mode);
   if (wanted) tasks_.Submit([this, path, old_path] { writer_.RefreshRenamed(path, old_path); });
-  if (StringStartWith(old_path, context_.root + "/")) CompareOnce(old_path);
+  if (base::IsBelow(old_path, context_.root)) CompareOnce(old_path);
   if (is_file) {
     tasks_.Submit([this, path] { RemoveBelow(path); });
   } else {
@@ -305,7 +305,7 @@ void OperationRunner::CompareOnce(const std::string& path) {
 
 void OperationRunner::Compare(const std::string& path) {
   if (path == context_.root) return CompareRoot();
-  if (!StringStartWith(path, context_.root + "/")) return;
+  if (!base::IsBelow(path, context_.root)) return;
   const auto remove_tree = [this, path] { RemoveTree(path); };
   if (context_.folders.PlaceOf(path) == Place::kOutside) return tasks_.Submit(remove_tree);
   struct stat status = {};

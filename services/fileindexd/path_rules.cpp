@@ -4,6 +4,7 @@
 
 #include <kova/fs.h>
 
+#include "base/path.h"
 #include "common/error.h"
 #include "common/file_util.h"
 #include "fileindex/util.h"
@@ -57,7 +58,7 @@ PathRules::Place PathRules::PlaceOf(const std::string& path) {
 
 bool PathRules::IsLeftOut(const std::string& path) {
   if (path == root_) return false;
-  if (!StringStartWith(path, root_ + "/")) return true;
+  if (!base::IsBelow(path, root_)) return true;
   struct stat status = {};
   const bool is_folder = lstat(path.c_str(), &status) == 0 && S_ISDIR(status.st_mode);
   return is_folder ? FolderIsLeftOut(path) : SkipName(Basename(path)) || FolderIsLeftOut(Dirname(path));

@@ -3,8 +3,8 @@
 #include <set>
 #include <string>
 
+#include "base/path.h"
 #include "base/path_table.h"
-#include "common/file_util.h"
 
 namespace ferrox::indexd {
 
@@ -14,7 +14,7 @@ class PathsUnderWay {
   /// Whether something at, above or below the path is worked on.
   bool Touch(const std::string& path) const {
     const auto next = ordered_.lower_bound(path + "/");
-    return (next != ordered_.end() && StringStartWith(*next, path + "/")) || paths_.HasAtOrAbove(path);
+    return (next != ordered_.end() && base::IsBelow(*next, path)) || paths_.HasAtOrAbove(path);
   }
   void Add(const std::string& path) {
     paths_.Insert(path, true);

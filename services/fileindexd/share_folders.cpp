@@ -5,6 +5,7 @@
 
 #include <json/value.h>
 
+#include "base/path.h"
 #include "common/error.h"
 #include "common/file_util.h"
 #include "common/json_util.h"
@@ -27,7 +28,7 @@ std::map<std::string, std::string, std::less<>> SharesBelow(const std::string& r
   for (const std::string& name : sdk::SDKShare::Enum()) {
     if (indexed.count(name) == 0) continue;
     const std::string path = sdk::SDKShare(name).GetPath();
-    if (StringStartWith(path, root + "/")) below[path] = name;
+    if (base::IsBelow(path, root)) below[path] = name;
   }
   return below;
 }
@@ -67,7 +68,7 @@ ShareFolders ShareFolders::Load(const std::string& share, const std::string& roo
   const fileindex::FolderMgr folder_mgr;
   for (const auto& folder : folder_mgr.GetFolders()) {
     const std::string& path = folder->GetPath();
-    if (!StringStartWith(path + "/", "/" + share + "/")) continue;
+    if (!base::IsAtOrBelow(path, "/" + share)) continue;
     loaded.any_paused_ = loaded.any_paused_ || folder->IsPaused();
     loaded.Add(root + path.substr(1 + share.size()), fileindex::KindsOf(*folder));
   }
@@ -99,9 +100,8 @@ bool ShareFolders::IsInInner(std::string_view full_path) const {
 ShareFolders::Place ShareFolders::PlaceOf(std::string_view full_path) const {
   if (IsInInner(full_path)) return Place::kOutside;
   if (Governing(full_path) != nullptr) return Place::kIndexed;
-  const std::string below = std::string(full_path) + "/";
-  const auto next = kinds_.lower_bound(below);
-  return next != kinds_.end() && StringStartWith(next->first, below) ? Place::kOnTheWay : Place::kOutside;
+  const auto next = kinds_.lower_bound(std::string(full_path) + "/");
+  return next != kinds_.end() && base::IsBelow(next->first, full_path) ? Place::kOnTheWay : Place::kOutside;
 }
 
 bool ShareFolders::WantsContent(const std::string& full_path) const {
@@ -112,8 +112,8 @@ bool ShareFolders::WantsContent(const std::string& full_path) const {
 std::vector<std::string> ShareFolders::Topmost(const std::string& full_path) const {
   if (PlaceOf(full_path) == Place::kIndexed) return {full_path};
   std::vector<std::string> topmost;
-  const std::string below = full_path + "/";
-  for (auto at = kinds_.lower_bound(below); at != kinds_.end() && StringStartWith(at->first, below); ++at) {
+  auto at = kinds_.lower_bound(full_path + "/");
+  for (; at != kinds_.end() && base::IsBelow(at->first, full_path); ++at) {
     if (Governing(Dirname(at->first)) == nullptr) topmost.push_back(at->first);
   }
   return topmost;

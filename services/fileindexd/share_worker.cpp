@@ -10,6 +10,7 @@
 #include <utility>
 #include <vector>
 
+#include "base/path.h"
 #include "base/unique_fd.h"
 #include "common/clock.h"
 #include "common/error.h"
@@ -568,7 +569,7 @@ Json::Value ShareWorker::LeftOut(const ShareFolders& folders) const {
   Json::Value list(Json::arrayValue);
   std::string last;
   const auto is_new = [&last](const std::string& path) {
-    if (!last.empty() && StringStartWith(path, last + "/")) return false;
+    if (!last.empty() && base::IsBelow(path, last)) return false;
     last = path;
     return true;
   };

@@ -2,13 +2,13 @@
 
 #include <algorithm>
 
-#include "common/file_util.h"
+#include "base/path.h"
 
 namespace ferrox::indexd {
 
 std::string FindStray(ShareIndex& index, const std::vector<std::string>& folders) {
   const auto holder = [&folders](const std::string& path) {
-    const auto holds = [&path](const std::string& folder) { return StringStartWith(path + "/", folder + "/"); };
+    const auto holds = [&path](const std::string& folder) { return base::IsAtOrBelow(path, folder); };
     return std::find_if(folders.begin(), folders.end(), holds);
   };
   std::string after;
@@ -26,7 +26,7 @@ std::string FindStray(ShareIndex& index, const std::vector<std::string>& folders
 
 std::string TopOutside(const std::string& path, const std::string& root) {
   size_t end = path.find('/', 1);
-  while (end != std::string::npos && StringStartWith(root + "/", path.substr(0, end) + "/")) {
+  while (end != std::string::npos && base::IsAtOrBelow(root, std::string_view(path).substr(0, end))) {
     end = path.find('/', end + 1);
   }
   return path.substr(0, end);

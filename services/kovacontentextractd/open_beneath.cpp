@@ -8,6 +8,8 @@
 
 #include <cerrno>
 
+#include "base/path.h"
+
 namespace ferrox::extract {
 
 namespace {
@@ -57,12 +59,12 @@ int Open(int root, const std::string& below, int flags, bool may_ask_kernel) {
 }  // namespace
 
 base::UniqueFd OpenBeneath(const std::string& root, const std::string& path, bool may_ask_kernel) {
-  const bool is_below = path.size() > root.size() + 1 && path.compare(0, root.size(), root) == 0 &&
-                        path[root.size()] == '/' && path.find('\0') == std::string::npos;
+  const size_t begin = root == "/" ? 1 : root.size() + 1;
+  const bool is_below = base::IsBelow(path, root) && path.size() > begin && path.find('\0') == std::string::npos;
   if (!is_below) return errno = EINVAL, base::UniqueFd();
   const base::UniqueFd folder(open(root.empty() ? "/" : root.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
   if (!folder.Valid()) return base::UniqueFd();
-  const std::string below = path.substr(root.size() + 1);
+  const std::string below = path.substr(begin);
   int fd = Open(folder.Get(), below, kFileFlags | O_NOATIME, may_ask_kernel);
   if (fd < 0 && errno == EPERM) fd = Open(folder.Get(), below, kFileFlags, may_ask_kernel);
   return base::UniqueFd(fd);

@@ -7,6 +7,7 @@
 #include <tuple>
 #include <utility>
 
+#include "base/path.h"
 #include "common/clock.h"
 #include "fileindex/util.h"
 #include "services/kovaelasticd/words.h"
@@ -36,11 +37,6 @@ bool IsFilter(QueryNode::Type type) {
 
 int32_t KindOfExtension(const std::string& ext) {
   return static_cast<int32_t>(fileindex::GetFileTypeByFullPath("." + ext));
-}
-
-bool IsBelow(std::string_view path, const std::string& folder) {
-  if (path.substr(0, folder.size()) != folder) return false;
-  return path.size() == folder.size() || path[folder.size()] == '/';
 }
 
 std::string GramExpression(const std::string& text) {
@@ -210,7 +206,7 @@ bool Searcher::MatchesFilter(int64_t id, const QueryNode& filter) {
     case QueryNode::Type::kDate:
       return in_range(3);
     default:
-      return IsBelow(statement.Text(4), filter.text);
+      return base::IsAtOrBelow(statement.Text(4), filter.text);
   }
 }
 

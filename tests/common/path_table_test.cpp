@@ -5,6 +5,8 @@
 
 #include <gtest/gtest.h>
 
+#include "base/path.h"
+
 namespace ferrox::fileindex {
 
 namespace {
@@ -19,6 +21,13 @@ struct CountingHash {
 };
 
 }  // namespace
+
+TEST(PathTest, AFolderHoldsWhatFollowsItByWholeNames) {
+  for (const char* path : {"/v/a", "/v/a/", "/v/a/b"}) EXPECT_TRUE(base::IsAtOrBelow(path, "/v/a")) << path;
+  for (const char* path : {"/v/ab", "/v", "/", ""}) EXPECT_FALSE(base::IsAtOrBelow(path, "/v/a")) << path;
+  for (const char* root : {"/", ""}) EXPECT_TRUE(base::IsBelow("/v", root) && base::IsAtOrBelow(root, root)) << root;
+  EXPECT_FALSE(base::IsBelow("/", "/") || base::IsBelow("/v/a", "/v/a") || base::IsAtOrBelow("", "/"));
+}
 
 TEST(PathTableTest, ValuesAreFoundFromTheirPathAndBelow) {
   std::mt19937 random(7);

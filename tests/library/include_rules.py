@@ -35,8 +35,7 @@ FORWARDING |= {"common/unique_fd.h", "common/scope_exit.h", "fileindex/elastic/f
 # What reaches further, and why.
 EXCEPTIONS = {
     # A queue is read into a tree, and one that is searched keeps the folders loaded.
-    "fileindex/queue/queue_mgr.cpp": ["fileindex/optree/optree.h", "fileindex/optree/op_path.h",
-                                      "fileindex/folders/folder_mgr.h"],
+    "fileindex/queue/queue_mgr.cpp": ["fileindex/optree/optree.h", "fileindex/folders/folder_mgr.h"],
     # The daemons' main functions know the host that they run on: its table of shares, its registry, its services.
     "services/fileindexd/main.cpp": ["platform/host/share_table.h", "platform/host/mounts.h"],
     "services/kovanotifyd/main.cpp": ["platform/host/configuration.h", "platform/host/notify_registry.h"],

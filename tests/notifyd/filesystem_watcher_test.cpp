@@ -24,6 +24,7 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include "base/path.h"
 #include "base/scope_exit.h"
 #include "tests/support/temp_dir.h"
 
@@ -313,20 +314,17 @@ class BelievedTree {
   const std::map<std::string, bool>& Names() const { return names_; }
 
  private:
-  static bool IsAtOrBelow(const std::string& path, const std::string& top) {
-    return path == top || path.compare(0, top.size() + 1, top + "/") == 0;
-  }
   void Erase(const std::string& top) {
-    std::erase_if(names_, [&top](const auto& name) { return IsAtOrBelow(name.first, top); });
+    std::erase_if(names_, [&top](const auto& name) { return base::IsAtOrBelow(name.first, top); });
   }
   void Move(const std::string& from, const std::string& to, bool is_folder) {
     std::map<std::string, bool> moved = {{to, is_folder}};
     for (const auto& [path, kind] : names_) {
-      if (IsAtOrBelow(path, from)) moved[to + path.substr(from.size())] = kind;
+      if (base::IsAtOrBelow(path, from)) moved[to + path.substr(from.size())] = kind;
     }
     std::set<std::string> doubts;
     for (const std::string& path : in_doubt_)
-      doubts.insert(IsAtOrBelow(path, from) ? to + path.substr(from.size()) : path);
+      doubts.insert(base::IsAtOrBelow(path, from) ? to + path.substr(from.size()) : path);
     in_doubt_.merge(doubts);
     Erase(from);
     Erase(to);

@@ -6,6 +6,8 @@
 
 #include <gtest/gtest.h>
 
+#include "base/path.h"
+
 namespace ferrox::notifyd {
 namespace {
 
@@ -20,10 +22,6 @@ std::set<std::string> PathsIn(const FolderTree& tree, Id top) {
   return paths;
 }
 
-bool IsAtOrBelow(const std::string& path, const std::string& folder) {
-  return path == folder || path.compare(0, folder.size() + 1, folder + "/") == 0;
-}
-
 /// Paths and their keys, changed in the plainest way.
 using Model = std::map<std::string, FolderKey>;
 
@@ -34,13 +32,13 @@ void AddParents(Model& model, const std::string& path) {
 }
 
 void RemoveFrom(Model& model, const std::string& folder) {
-  std::erase_if(model, [&folder](const auto& entry) { return IsAtOrBelow(entry.first, folder); });
+  std::erase_if(model, [&folder](const auto& entry) { return base::IsAtOrBelow(entry.first, folder); });
 }
 
 void MoveIn(Model& model, const std::string& from, const std::string& to) {
   Model moved;
   for (const auto& [path, key] : model) {
-    moved[IsAtOrBelow(path, from) ? to + path.substr(from.size()) : path] = key;
+    moved[base::IsAtOrBelow(path, from) ? to + path.substr(from.size()) : path] = key;
   }
   model = moved;
 }
@@ -73,7 +71,7 @@ TEST(FolderTreeTest, IsWhatAPlainListOfPathsWouldBe) {
       RemoveFrom(model, from);
       EXPECT_EQ(removed, before - model.size());
       EXPECT_EQ(tree.Get(ref), FolderTree::kNone);
-    } else if (model.count(path) == 0 && !IsAtOrBelow(path, from)) {
+    } else if (model.count(path) == 0 && !base::IsAtOrBelow(path, from)) {
       const size_t slash = path.rfind('/');
       const Id parent = tree.FindOrAdd(path.substr(0, slash));
       AddParents(model, path);

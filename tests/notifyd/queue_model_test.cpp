@@ -7,6 +7,7 @@
 
 #include <gtest/gtest.h>
 
+#include "base/path.h"
 #include "fileindex/optree/optree.h"
 #include "fileindex/queue/queue_mgr.h"
 #include "services/kovanotifyd/queues/folder_cover.h"
@@ -21,10 +22,6 @@ using fileindex::FileIndexOP;
 using fileindex::OP;
 using std::chrono::milliseconds;
 using Kind = Change::Kind;
-
-bool IsAtOrBelow(const std::string& path, const std::string& folder) {
-  return path == folder || path.starts_with(folder + "/");
-}
 
 enum Look { kNone, kAttributes, kContent, kAllBelow };
 
@@ -46,7 +43,7 @@ class Reader {
   void Expect(const std::string& path, Look look) {
     if (path.find("/@eaDir") != std::string::npos) return;
     for (const std::string& root : roots_) {
-      if (IsAtOrBelow(path, root)) expected_[path] = std::max(expected_[path], look);
+      if (base::IsAtOrBelow(path, root)) expected_[path] = std::max(expected_[path], look);
     }
   }
   void Process() {
@@ -75,7 +72,8 @@ class Reader {
     // Nothing is below what is no folder, and nothing is known to have been there.
     if (look == kContent && !IsFolder(files_, at) && !IsFolder(known_, at)) look = kAllBelow;
     (void)std::erase_if(expected_, [&](const auto& expected) {
-      return look == kAllBelow ? IsAtOrBelow(expected.first, at) : expected.first == at && expected.second <= look;
+      return look == kAllBelow ? base::IsAtOrBelow(expected.first, at)
+                               : expected.first == at && expected.second <= look;
     });
   }
 
@@ -121,18 +119,18 @@ class QueueModelTest : public testing::Test {
   void Delete(const std::string& path) {
     const std::map<std::string, bool> before = files_;
     for (auto at = before.rbegin(); at != before.rend(); ++at) {
-      if (!IsAtOrBelow(at->first, path)) continue;
+      if (!base::IsAtOrBelow(at->first, path)) continue;
       files_.erase(at->first);
       Put(Kind::kDeleted, at->second, at->first);
     }
   }
   void Rename(const std::string& from, const std::string& to) {
     const bool is_folder = files_[from];
-    if (IsAtOrBelow(to, from) || !CanAppear(to) || (files_.count(to) != 0 && (is_folder || files_[to]))) return;
+    if (base::IsAtOrBelow(to, from) || !CanAppear(to) || (files_.count(to) != 0 && (is_folder || files_[to]))) return;
     files_.erase(to);
     std::map<std::string, bool> moved;
     for (const auto& [path, kind] : files_)
-      moved[IsAtOrBelow(path, from) ? to + path.substr(from.size()) : path] = kind;
+      moved[base::IsAtOrBelow(path, from) ? to + path.substr(from.size()) : path] = kind;
     files_ = moved;
     Put(Kind::kRenamed, is_folder, to, from);
   }
@@ -211,7 +209,7 @@ TEST_F(QueueModelTest, FewFoldersCoverMany) {
     EXPECT_LE(cover.size(), std::max(most, roots.size()));
     for (const ComparedFolder& folder : folders) {
       EXPECT_EQ(std::count_if(cover.begin(), cover.end(),
-                              [&](const ComparedFolder& over) { return IsAtOrBelow(folder.path, over.path); }),
+                              [&](const ComparedFolder& over) { return base::IsAtOrBelow(folder.path, over.path); }),
                 1)
           << folder.path;
     }

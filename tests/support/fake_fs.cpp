@@ -4,8 +4,8 @@
 
 #include <kova/fs.h>
 
+#include "base/path.h"
 #include "platform/shared/failure.h"
-#include "platform/shared/path_match.h"
 #include "tests/support/fake_platform.h"
 
 using ferrox::test::FakeCallFails;
@@ -16,7 +16,7 @@ int KOVAGetFSType(const char* path, int follow_mount) {
   int type = KOVA_FS_EXT;
   size_t best = 0;
   for (const auto& [prefix, code] : FakePlatform::Get().fs_types) {
-    if (prefix.size() < best || !kova::IsAtOrBelow(path, prefix)) continue;
+    if (prefix.size() < best || !base::IsAtOrBelow(path, prefix)) continue;
     best = prefix.size();
     type = code;
   }
@@ -32,7 +32,7 @@ int KLIBFhsPathInSnapshot(const char* path, int* in_snapshot) {
   if (FakeCallFails(__func__, path)) return -1;
   *in_snapshot = 0;
   for (const std::string& folder : FakePlatform::Get().snapshots) {
-    if (kova::IsAtOrBelow(path, folder)) *in_snapshot = 1;
+    if (base::IsAtOrBelow(path, folder)) *in_snapshot = 1;
   }
   return 0;
 }

@@ -4,9 +4,9 @@
 #include <kova/recycle.h>
 #include <kova/share.h>
 
+#include "base/path.h"
 #include "platform/shared/failure.h"
 #include "platform/shared/index_paths.h"
-#include "platform/shared/path_match.h"
 #include "platform/shared/records.h"
 #include "tests/support/fake_platform.h"
 
@@ -26,7 +26,7 @@ int FlagGet(const char* function, const KOVAShare* share, int FakeShare::*flag, 
 
 int AnyHolds(const std::set<std::string>& folders, const std::string& path) {
   for (const std::string& folder : folders) {
-    if (kova::IsAtOrBelow(path, folder)) return 1;
+    if (base::IsAtOrBelow(path, folder)) return 1;
   }
   return 0;
 }
@@ -76,7 +76,7 @@ int KOVAShareNamePathGet(const char* full_path, char* name, size_t name_size, ch
   if (FakeCallFails(__func__, full_path)) return -1;
   const std::pair<const std::string, FakeShare>* best = nullptr;
   for (const auto& entry : FakePlatform::Get().shares) {
-    if (!kova::IsAtOrBelow(full_path, entry.second.path)) continue;
+    if (!base::IsAtOrBelow(full_path, entry.second.path)) continue;
     if (best == nullptr || entry.second.path.size() > best->second.path.size()) best = &entry;
   }
   if (best == nullptr) return KOVA_FAIL(KOVA_ERR_NO_SUCH_SHARE);

@@ -5,6 +5,8 @@
 #include <string_view>
 #include <utility>
 
+#include "base/path.h"
+
 namespace ferrox::notifyd {
 
 namespace {
@@ -16,16 +18,12 @@ bool IsBefore(const ComparedFolder& a, const ComparedFolder& b) {
                                       [&](char x, char y) { return rank(x) < rank(y); });
 }
 
-bool IsAtOrBelow(std::string_view path, std::string_view folder) {
-  return path.starts_with(folder) && (path.size() == folder.size() || path[folder.size()] == '/' || folder == "/");
-}
-
 /// Sorts the folders and removes those that lie in another one.
 void DropCovered(std::vector<ComparedFolder>& folders) {
   std::sort(folders.begin(), folders.end(), IsBefore);
   size_t kept = 0;
   for (ComparedFolder& folder : folders) {
-    if (kept > 0 && IsAtOrBelow(folder.path, folders[kept - 1].path)) continue;
+    if (kept > 0 && base::IsAtOrBelow(folder.path, folders[kept - 1].path)) continue;
     std::swap(folders[kept++], folder);
   }
   folders.resize(kept);
@@ -64,7 +62,7 @@ std::vector<Group> GroupsByRoot(const std::vector<ComparedFolder>& folders) {
   for (size_t begin = 0; begin != folders.size();) {
     const std::string_view root = std::string_view(folders[begin].path).substr(0, folders[begin].root_size);
     size_t end = begin + 1;
-    while (end != folders.size() && IsAtOrBelow(folders[end].path, root)) ++end;
+    while (end != folders.size() && base::IsAtOrBelow(folders[end].path, root)) ++end;
     groups.push_back(GroupOf(folders, begin, end));
     begin = end;
   }

@@ -9,7 +9,7 @@
 
 #include <kova/mountinfo.h>
 
-#include "services/kovanotifyd/roots/watch_roots.h"
+#include "base/path.h"
 
 namespace ferrox::notifyd {
 
@@ -84,7 +84,7 @@ uint64_t MountTable::MountOf(const std::string& path) const {
   uint64_t nearest = 0;
   size_t depth = 0;
   for (const auto& [id, line] : lines_) {
-    if (line.point.size() < depth || !IsAtOrBelow(path, line.point)) continue;
+    if (line.point.size() < depth || !base::IsAtOrBelow(path, line.point)) continue;
     depth = line.point.size();
     nearest = id;
   }

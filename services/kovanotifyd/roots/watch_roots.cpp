@@ -4,6 +4,8 @@
 #include <map>
 #include <set>
 
+#include "base/path.h"
+
 namespace ferrox::notifyd {
 
 namespace {
@@ -34,13 +36,8 @@ bool HasComponentOf(const std::string& path, size_t from, const Names& names) {
 
 }  // namespace
 
-bool IsAtOrBelow(const std::string& path, const std::string& folder) {
-  return path.compare(0, folder.size(), folder) == 0 &&
-         (path.size() == folder.size() || folder.back() == '/' || path[folder.size()] == '/');
-}
-
 bool Covers(const WatchRoot& outer, const WatchRoot& inner) {
-  if (!IsAtOrBelow(inner.path, outer.path)) return false;
+  if (!base::IsAtOrBelow(inner.path, outer.path)) return false;
   const Names ignored(outer.ignore.begin(), outer.ignore.end());
   const Names ignored_inside(inner.ignore.begin(), inner.ignore.end());
   return std::includes(ignored_inside.begin(), ignored_inside.end(), ignored.begin(), ignored.end()) &&

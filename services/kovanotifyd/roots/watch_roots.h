@@ -9,9 +9,6 @@
 
 namespace ferrox::notifyd {
 
-/// Whether `path` is `folder` or lies below it. Neither is empty.
-bool IsAtOrBelow(const std::string& path, const std::string& folder);
-
 /// Whether whoever watches `outer`, and leaves out what it ignores there, sees all of `inner`, when both are on one
 /// mount.
 bool Covers(const WatchRoot& outer, const WatchRoot& inner);

@@ -7,6 +7,7 @@
 
 #include <kova/fs.h>
 
+#include "base/path.h"
 #include "common/log.h"
 #include "services/kovanotifyd/roots/watch_roots.h"
 
@@ -132,12 +133,12 @@ void WatchSet::Examine() {
 void WatchSet::OnMountChanged(const std::string& point) {
   for (const Registration& registration : registrations_) {
     for (const QueueWatch& watch : registration.watches) {
-      if (IsAtOrBelow(watch.path, point)) return;
+      if (base::IsAtOrBelow(watch.path, point)) return;
     }
   }
   bool is_below = false;
   for (auto& [path, root] : roots_) {
-    if (root.state == Root::State::kWaiting || !IsAtOrBelow(point, path)) continue;
+    if (root.state == Root::State::kWaiting || !base::IsAtOrBelow(point, path)) continue;
     is_below = true;
     const bool may_lack_watches = !IsScanned(root) && ways_[root.way].watcher->WatchesEachFolder();
     if (may_lack_watches && !mounts_.IsMountedAt(point)) ExamineRoot(root, true);
