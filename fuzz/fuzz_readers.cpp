@@ -1,5 +1,5 @@
 // All readers of files: any bytes give valid UTF-8 within the limits. The first line
-// names the reader; tests/corpus/seeds.py makes the seeds. What a library does to its memory is found here too.
+// names the reader. What a library does to its memory is found here too.
 
 #include <sys/mman.h>
 #include <unistd.h>

@@ -1,17 +1,30 @@
 """Files that mean harm to whoever reads them: bombs, loops, lies about sizes, and what is no file at all.
 
-python3 hostile.py FOLDER: makes them there, in "set" by subject. Nothing here is random.
+python3 hostile.py FOLDER: makes them there, in "set" by subject. Nothing here is random. Those of a format are kept in
+hostile_files, named after what is wrong in them: as they are, or, with ".packed" behind the name, as `xz -9` packs them.
+hostile_files/sizes.txt has those that go on as a hole, with their whole length in bytes.
 """
 
+import lzma
 import os
 import sys
 
-import hostile_archives
-import hostile_documents
-import hostile_media
-from seeds import seeds
-
+HERE = os.path.dirname(os.path.abspath(__file__))
+FILES = os.path.join(HERE, "hostile_files")
+SEEDS = os.path.join(HERE, "..", "..", "fuzz", "corpus", "readers")
+PACKED = ".packed"
 TEN_TERABYTES = 10 << 40
+
+
+def read(path):
+    with open(path, "rb") as file:
+        return file.read()
+
+
+def seeds():
+    """The smallest well-formed file of each format, by extension: what the fuzzer starts with, without the first line,
+    which names the reader. Each holds the word "zeppelin", in its text or its title."""
+    return {name.split(".", 1)[1]: read(os.path.join(SEEDS, name)).split(b"\n", 1)[1] for name in sorted(os.listdir(SEEDS))}
 
 
 class HostileSet:
@@ -46,6 +59,17 @@ class HostileSet:
             make(path)
         except OSError:
             self.paths.remove(path)
+
+
+def add_formats(out):
+    with open(os.path.join(FILES, "sizes.txt"), encoding="ascii") as file:
+        sizes = {name: int(size) for size, name in map(str.split, file)}
+    for parent, _, names in os.walk(FILES):
+        for path in (os.path.join(parent, name) for name in names if parent != FILES):
+            name = os.path.relpath(path, FILES)
+            content = lzma.decompress(read(path)) if name.endswith(PACKED) else read(path)
+            name = name.removesuffix(PACKED)
+            out.add(name, content, size=sizes.get(name, 0))
 
 
 def add_sizes(out):
@@ -90,9 +114,7 @@ def add_names(out):
 def make_all(folder):
     """Makes all of them. @return their paths, as bytes, in a fixed order."""
     out = HostileSet(os.path.join(folder, "set"))
-    hostile_documents.add(out)
-    hostile_archives.add(out)
-    hostile_media.add(out)
+    add_formats(out)
     add_sizes(out)
     add_what_is_no_file(out)
     add_names(out)

@@ -23,7 +23,6 @@ from instance import InstanceTestCase, children, process_facts, wait_for, worker
 
 sys.path.insert(0, os.path.join(os.path.dirname(os.path.abspath(__file__)), "..", "corpus"))
 import hostile  # noqa: E402
-from seeds import seeds  # noqa: E402
 
 DAEMON = "kovacontentextractd"
 SEED = int(os.environ.get("FERROX_SEED", "20240301"))
@@ -194,7 +193,7 @@ class HostileTest(InstanceTestCase):
 
     def damaged(self):
         """Jobs that damage the good files and have them read."""
-        good = [(name, content) for name, content in seeds().items()]
+        good = [(name, content) for name, content in hostile.seeds().items()]
         files = [("seed." + name, content) for name, content in good]
         for parent, _, names in os.walk(os.path.join(CORPUS, "files") if CORPUS else "/nonexistent"):
             for name in names:
@@ -309,7 +308,7 @@ class HostileTest(InstanceTestCase):
         paths = hostile.make_all(os.fsdecode(self.folder))
         jobs = [lambda path=path: self.check(path) for path in paths]
         jobs += [lambda name=name, content=content: self.check_changing("seed." + name, content * 20)
-                 for name, content in seeds().items() if name in ("pdf", "jpg", "docx", "eml", "mp3", "mp4", "xls", "zip")]
+                 for name, content in hostile.seeds().items() if name in ("pdf", "jpg", "docx", "eml", "mp3", "mp4", "xls", "zip")]
         jobs.sort(key=lambda job: b"endless" not in (job.__defaults__[0] if len(job.__defaults__) == 1 else b""))
         self.survives(jobs)
         endless = [path for seconds, error, path in self.slow if error == "took too long"]
