@@ -41,14 +41,9 @@ void AddRecords(const FanRecord& record, uint64_t file, std::vector<FolderRecord
   constexpr struct {
     uint64_t bits;
     Kind kind;
-  } kKinds[] = {{kBoth, Kind::kUnsure},
-                {FAN_CREATE, Kind::kCreated},
-                {FAN_MODIFY, Kind::kModified},
-                {FAN_CLOSE_WRITE, Kind::kWritten},
-                {FAN_ATTRIB, Kind::kAttributes},
-                {FAN_DELETE, Kind::kDeleted},
-                {FAN_MOVE_SELF, Kind::kSelfMoved},
-                {FAN_DELETE_SELF, Kind::kSelfGone}};
+  } kKinds[] = {{kBoth, Kind::kUncertain},         {FAN_CREATE, Kind::kCreated},      {FAN_MODIFY, Kind::kModified},
+                {FAN_CLOSE_WRITE, Kind::kWritten}, {FAN_ATTRIB, Kind::kAttributes},   {FAN_DELETE, Kind::kDeleted},
+                {FAN_MOVE_SELF, Kind::kSelfMoved}, {FAN_DELETE_SELF, Kind::kSelfGone}};
   const std::string_view name = record.name == "." ? std::string_view() : record.name;
   const FolderKey folder = Shorten(record.folder.empty() ? record.target : record.folder);
   if ((record.mask & FAN_RENAME) != 0) {

@@ -20,7 +20,7 @@ struct FolderRecord {
     kRenamed,    ///< a side where nothing is watched is missing: its folder is 0
     kSelfMoved,  ///< the folder itself has another place or name
     kSelfGone,   ///< the folder is not watched any more: removed or unmounted
-    kUnsure,     ///< the name was made and removed, nobody knows in which order
+    kUncertain,  ///< the name was made and removed, in an order that is not known
     kLost,       ///< the kernel dropped records here
   };
 

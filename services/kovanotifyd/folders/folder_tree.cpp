@@ -36,7 +36,7 @@ void IdTable::Erase(uint32_t id) {
   --live_;
 }
 
-/// Without the erased ones, and between half full and a quarter.
+/// Drops the erased slots; afterwards the table is between a quarter and half full.
 void IdTable::Rebuild() {
   size_t size = kFewestSlots;
   while (size < (live_ + 1) * 2) size *= 2;
@@ -188,6 +188,31 @@ std::string FolderTree::Path(Id id, std::string_view name) const {
 bool FolderTree::IsWithin(Id id, Id top) const {
   while (id != top && id != kTop) id = nodes_[id].parent;
   return id == top;
+}
+
+bool FolderTree::HasAtOrAbove(Id id, Flag flag) const {
+  while (id != kTop && !Has(id, flag)) id = nodes_[id].parent;
+  return Has(id, flag);
+}
+
+uint64_t FolderTree::CountKeys(Id top) const {
+  uint64_t keys = 0;
+  for (Id at = top; at != kNone;) {
+    if (nodes_[at].key != 0) ++keys;
+    if (nodes_[at].first_child != kNone) {
+      at = nodes_[at].first_child;
+      continue;
+    }
+    while (at != top && nodes_[at].next == kNone) at = nodes_[at].parent;
+    at = at == top ? kNone : nodes_[at].next;
+  }
+  return keys;
+}
+
+std::vector<FolderTree::Ref> FolderTree::Children(Id id) const {
+  std::vector<Ref> children;
+  for (Id at = nodes_[id].first_child; at != kNone; at = nodes_[at].next) children.push_back(RefOf(at));
+  return children;
 }
 
 void FolderTree::Set(Id id, Flag flag, bool on) {

@@ -13,14 +13,15 @@ namespace ferrox::notifyd {
 /// The kernel's name for a watched folder, as a port gives it; 0 is none.
 using FolderKey = uint64_t;
 
-/// A set of numbers that are found by the hash of what they stand for. Whoever uses it knows what that is.
+/// A hash set of numbers that stand for something else, such as indices into a vector: hash and equality are those of
+/// what they stand for. Open addressing, 4 bytes a slot.
 class IdTable {
  public:
   using Hash = std::function<uint32_t(uint32_t id)>;
 
   explicit IdTable(Hash hash);
 
-  /// The id for which `matches` holds, among those with this hash and a few others; kNone without.
+  /// The id for which `matches` holds, which must be one with this hash; kEmpty when there is none.
   template <typename Matches>
   uint32_t Find(uint32_t hash, Matches matches) const {
     for (size_t at = hash & Mask();; at = (at + 1) & Mask()) {
@@ -40,19 +41,21 @@ class IdTable {
 
   Hash hash_;
   std::vector<uint32_t> slots_;  ///< their number is a power of two
-  size_t used_ = 0;              ///< slots that are not empty
-  size_t live_ = 0;
+  size_t used_ = 0;              ///< slots that are not kEmpty
+  size_t live_ = 0;              ///< slots that are neither kEmpty nor kErased
 };
 
-/// Folders by name and by the kernel's key, from "/" down: those that are watched and those that lead to them. Moving
-/// or finding one costs the same however much is below it. About 100 bytes a folder.
+/// A tree of folders, from "/" down, that are found by their place (parent and name) and by the kernel's key: those
+/// that are watched, and those that lead to them. Moving or finding a folder costs the same however much is below it.
+/// Takes about 100 bytes a folder, without its name. Ids are reused: what keeps one while others change the tree keeps
+/// a Ref.
 class FolderTree {
  public:
   using Id = uint32_t;
   static constexpr Id kNone = UINT32_MAX;
   static constexpr Id kTop = 0;
 
-  /// A folder for later, when it may be gone and its id another's.
+  /// Refers to a folder that may be removed meanwhile, and its id given to another one (Get).
   struct Ref {
     Id id = kNone;
     uint16_t serial = 0;
@@ -60,9 +63,9 @@ class FolderTree {
   enum Flag : uint8_t {
     kRoot = 1,        ///< a root of the watcher
     kPassage = 2,     ///< has a root below it
-    kUnreadable = 4,  ///< cannot be watched until its permissions change
-    kMoved = 8,       ///< renamed since the kernel's records had all been read
-    kSeen = 16,       ///< found by the listing under way
+    kUnreadable = 4,  ///< could not be opened; its permissions may change
+    kMoved = 8,       ///< moved by a record since all of the kernel's records had been read
+    kListed = 16,     ///< found on disk by the listing under way
   };
 
   FolderTree();
@@ -72,25 +75,27 @@ class FolderTree {
   Id Child(Id parent, std::string_view name) const;
   /// The name must not be there yet.
   Id Add(Id parent, std::string_view name);
-  /// The folder of an absolute path, made with all that lead to it where it is missing.
+  /// The folder of an absolute path; what is missing of it is added.
   Id FindOrAdd(std::string_view path);
   /// To a place where nothing is, and which is not below the folder itself.
   void Move(Id id, Id parent, std::string_view name);
-  /// Removes a folder and all below it; each is handed to `before` first, deepest first. Never the top.
+  /// Removes a folder and all below it, deepest first; `before` is called with each of them. Not for the top.
   void Remove(Id id, const std::function<void(Id)>& before);
 
   Id ByKey(FolderKey key) const;
   /// The key must not be another folder's.
   void SetKey(Id id, FolderKey key);
   FolderKey Key(Id id) const { return nodes_[id].key; }
-  /// How many have one.
+  /// How many folders have a key; and those at and below a folder, which takes a walk through them.
   uint64_t Keys() const { return keys_; }
-  /// Grows whenever a key is set or a folder moved.
+  uint64_t CountKeys(Id top) const;
+  /// Grows whenever a key is set or a folder is moved, that is, when CountKeys may change.
   uint64_t Changes() const { return changes_; }
 
   Id Parent(Id id) const { return nodes_[id].parent; }
   Id FirstChild(Id id) const { return nodes_[id].first_child; }
   Id NextSibling(Id id) const { return nodes_[id].next; }
+  std::vector<Ref> Children(Id id) const;
   std::string_view Name(Id id) const { return {nodes_[id].name.get(), nodes_[id].name_size}; }
   std::string Path(Id id) const;
   std::string Path(Id id, std::string_view name) const;
@@ -98,10 +103,15 @@ class FolderTree {
   bool IsWithin(Id id, Id top) const;
 
   bool Has(Id id, Flag flag) const { return (nodes_[id].flags & flag) != 0; }
+  bool HasAtOrAbove(Id id, Flag flag) const;
+  /// Whether the folder is a root or below one.
+  bool IsCovered(Id id) const { return HasAtOrAbove(id, kRoot); }
+  /// Whether the folder is a root or above one.
+  bool LeadsToRoot(Id id) const { return (nodes_[id].flags & (kRoot | kPassage)) != 0; }
   void Set(Id id, Flag flag, bool on);
 
   Ref RefOf(Id id) const { return {id, nodes_[id].serial}; }
-  /// kNone when it is gone.
+  /// The folder, or kNone when it was removed.
   Id Get(Ref ref) const;
 
  private:
@@ -124,8 +134,8 @@ class FolderTree {
   void Unlink(Id id);
   Id Allocate();
 
-  std::deque<Node> nodes_;
-  Id free_ = kNone;
+  std::deque<Node> nodes_;  ///< by id
+  Id free_ = kNone;         ///< the first free node
   uint64_t keys_ = 0;
   uint64_t changes_ = 1;
   IdTable by_place_;
