@@ -32,9 +32,9 @@ Index::Index(std::unique_ptr<IndexStore> store, std::string marker_path, std::ch
 
 Index::~Index() { Close(); }
 
-/// What the store does; that its file is damaged is told.
+/// Runs what uses the store; on_damage_ is called when that finds the file damaged.
 template <typename Run>
-auto Index::Watched(Run run) {
+auto Index::ReportingDamage(Run run) {
   try {
     return run();
   } catch (const IndexDamaged&) {
@@ -52,52 +52,56 @@ void Index::Commit() { Submit(Kind::kCommit, nullptr); }
 void Index::Submit(Kind kind, const Job* job) {
   Task task{kind, job, nullptr, false};
   {
-    std::unique_lock<std::mutex> lock(mutex_);
+    const base::MutexLock lock(mutex_);
     if (stopping_) throw Error(Error::kEngineIndexPaused, "the index was closed meanwhile; resume it");
     tasks_.push_back(&task);
-    wake_thread_.notify_one();
-    wake_callers_.wait(lock, [&task] { return task.done; });
+    wake_thread_.NotifyOne();
+    while (!task.done) wake_callers_.Wait(mutex_);
   }
   if (task.failure != nullptr) std::rethrow_exception(task.failure);
 }
 
 SearchReply Index::Search(const SearchRequest& request) {
-  const std::shared_lock<std::shared_mutex> guard(store_mutex_);
+  const base::ReaderLock guard(store_mutex_);
   if (store_ == nullptr) throw Error(Error::kEngineIndexPaused, "the index was closed meanwhile; resume it");
-  return Watched([&] { return store_->Search(request); });
+  return ReportingDamage([&] { return store_->Search(request); });
 }
 
 StoreStat Index::Stat() {
-  const std::shared_lock<std::shared_mutex> guard(store_mutex_);
+  const base::ReaderLock guard(store_mutex_);
   if (store_ == nullptr) throw Error(Error::kEngineIndexPaused, "the index was closed meanwhile; resume it");
-  return Watched([&] { return store_->Stat(); });
+  return ReportingDamage([&] { return store_->Stat(); });
 }
 
 void Index::Close() {
   {
-    const std::lock_guard<std::mutex> lock(mutex_);
+    const base::MutexLock lock(mutex_);
     stopping_ = true;
-    wake_thread_.notify_one();
+    wake_thread_.NotifyOne();
   }
   if (thread_.joinable()) thread_.join();
-  const std::unique_lock<std::shared_mutex> guard(store_mutex_);
+  const base::WriterLock guard(store_mutex_);
   store_.reset();
 }
 
-/// Takes all that waits; nothing when the time for a commit has come, or the end.
+/// Waits for tasks and takes all of them; none when the time for an automatic commit has come, or the end.
 std::deque<Index::Task*> Index::WaitForTasks() {
-  std::unique_lock<std::mutex> lock(mutex_);
-  const auto ready = [this] { return stopping_ || !tasks_.empty(); };
-  if (uncommitted_ > 0) {
-    (void)wake_thread_.wait_until(lock, auto_commit_at_, ready);
-  } else {
-    wake_thread_.wait(lock, ready);
+  const base::MutexLock lock(mutex_);
+  while (!stopping_ && tasks_.empty()) {
+    if (uncommitted_ == 0) {
+      wake_thread_.Wait(mutex_);
+    } else if (!wake_thread_.WaitUntil(mutex_, auto_commit_at_)) {
+      break;
+    }
   }
   std::deque<Task*> tasks;
   tasks.swap(tasks_);
   return tasks;
 }
 
+/// Runs tasks in turns: changes and reads of one turn in their order, then one commit for all of them that ask for it.
+/// A commit waits for the disk; callers that come meanwhile share the next turn, so the rate of commits adapts to the
+/// disk.
 void Index::ThreadMain() {
   for (;;) {
     const std::deque<Task*> tasks = WaitForTasks();
@@ -112,9 +116,9 @@ void Index::ThreadMain() {
     if (!commits.empty()) CommitFor(commits);
     bool stop = false;
     {
-      const std::lock_guard<std::mutex> lock(mutex_);
+      const base::MutexLock lock(mutex_);
       for (Task* task : tasks) task->done = true;
-      wake_callers_.notify_all();
+      wake_callers_.NotifyAll();
       stop = stopping_ && tasks_.empty();
     }
     const bool due = uncommitted_ > 0 &&
@@ -126,13 +130,14 @@ void Index::ThreadMain() {
 
 void Index::Execute(Task& task) {
   try {
-    Watched([&] { task.kind == Kind::kRead ? (*task.job)(*store_) : RunChange(task); });
+    ReportingDamage([&] { task.kind == Kind::kRead ? (*task.job)(*store_) : RunChange(task); });
   } catch (...) {
     task.failure = std::current_exception();
   }
 }
 
-/// Any failure that the store did not foresee leaves the transaction in an unknown state: it is given up.
+/// A bad request leaves the transaction as it was. Any other failure leaves it in an unknown state: it is rolled back,
+/// and all changes since the last commit are lost.
 void Index::RunChange(Task& task) {
   Mark();
   try {
@@ -159,7 +164,7 @@ void Index::LoseChanges() {
 
 void Index::CommitStore() {
   try {
-    Watched([&] { store_->Commit(); });
+    ReportingDamage([&] { store_->Commit(); });
   } catch (...) {
     LoseChanges();
     throw;
@@ -167,6 +172,8 @@ void Index::CommitStore() {
   uncommitted_ = 0;
 }
 
+/// Commits for the callers that wait for it. A commit also fails when earlier changes, answered with success, were
+/// lost: the caller must send again what it sent since its last commit.
 void Index::CommitFor(const std::deque<Task*>& waiting) {
   std::exception_ptr failure;
   try {
@@ -175,11 +182,12 @@ void Index::CommitFor(const std::deque<Task*>& waiting) {
   } catch (...) {
     failure = std::current_exception();
   }
-  lost_ = false;  // whoever waits is told now
+  lost_ = false;  // reported to the callers by the failure below
   Unmark();
   for (Task* task : waiting) task->failure = failure;
 }
 
+/// Commits because of the time or the amount of changes. The marker stays where changes were lost.
 void Index::CommitByItself() {
   try {
     CommitStore();
@@ -189,6 +197,8 @@ void Index::CommitByItself() {
   }
 }
 
+/// Makes the marker file: an engine that starts and finds it knows that the last one died with uncommitted changes. Not
+/// synced: it tells of an engine that was killed, not of a host that lost power.
 void Index::Mark() {
   if (marked_) return;
   const base::UniqueFd marker(open(marker_path_.c_str(), O_WRONLY | O_CREAT | O_CLOEXEC | O_NOFOLLOW, 0600));

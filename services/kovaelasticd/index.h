@@ -2,16 +2,14 @@
 
 #include <atomic>
 #include <chrono>
-#include <condition_variable>
 #include <deque>
 #include <exception>
 #include <functional>
 #include <memory>
-#include <mutex>
-#include <shared_mutex>
 #include <string>
 #include <thread>
 
+#include "base/mutex.h"
 #include "services/kovaelasticd/index_store.h"
 
 namespace ferrox::engine {
@@ -55,11 +53,12 @@ class Index {
 
  private:
   enum class Kind { kRead, kWrite, kCommit };
+  /// One call of Write, Read or Commit; on the stack of its caller, who waits until it is done.
   struct Task {
     Kind kind;
     const Job* job;
-    std::exception_ptr failure;
-    bool done = false;
+    std::exception_ptr failure;  ///< set by the thread before `done`
+    bool done = false;           ///< guarded by mutex_
   };
 
   void Submit(Kind kind, const Job* job);
@@ -74,25 +73,27 @@ class Index {
   void Mark();
   void Unmark();
   template <typename Run>
-  auto Watched(Run run);
+  auto ReportingDamage(Run run);
 
-  std::shared_mutex store_mutex_;  ///< shared: uses the store; exclusive: closes it
+  /// Held for reading by a search and a figure of the store, for writing by Close. The thread, which alone writes to
+  /// the store, uses it without: Close waits for its end first.
+  base::SharedMutex store_mutex_;
   std::unique_ptr<IndexStore> store_;
   const std::string marker_path_;
   const std::chrono::milliseconds auto_commit_after_;
   const std::function<void()> on_damage_;
 
-  std::mutex mutex_;
-  std::condition_variable wake_thread_;
-  std::condition_variable wake_callers_;
-  std::deque<Task*> tasks_;
-  bool stopping_ = false;
+  base::Mutex mutex_;
+  base::ConditionVariable wake_thread_;
+  base::ConditionVariable wake_callers_;             ///< some tasks are done
+  std::deque<Task*> tasks_ BASE_GUARDED_BY(mutex_);  ///< of callers that wait, in the order of their calls
+  bool stopping_ BASE_GUARDED_BY(mutex_) = false;
 
   // Of the thread alone, except for reading the count.
   std::atomic<int64_t> uncommitted_{0};
-  bool marked_ = false;
-  bool lost_ = false;
-  std::chrono::steady_clock::time_point auto_commit_at_;
+  bool marked_ = false;  ///< the marker file is there
+  bool lost_ = false;    ///< changes that were answered with success are gone, and no commit has failed for it yet
+  std::chrono::steady_clock::time_point auto_commit_at_;  ///< while uncommitted_ is above 0
 
   std::thread thread_;
 };

@@ -145,7 +145,7 @@ void SqliteStore::LimitPages(int64_t pages) {
 
 std::unique_ptr<StoreReader> SqliteStore::BorrowReader() {
   {
-    const std::lock_guard<std::mutex> guard(readers_mutex_);
+    const base::MutexLock guard(readers_mutex_);
     if (!readers_.empty()) {
       std::unique_ptr<StoreReader> reader = std::move(readers_.back());
       readers_.pop_back();
@@ -156,7 +156,7 @@ std::unique_ptr<StoreReader> SqliteStore::BorrowReader() {
 }
 
 void SqliteStore::ReturnReader(std::unique_ptr<StoreReader> reader) {
-  const std::lock_guard<std::mutex> guard(readers_mutex_);
+  const base::MutexLock guard(readers_mutex_);
   if (readers_.size() < kIdleReadersMax) readers_.push_back(std::move(reader));
 }
 

@@ -2,11 +2,11 @@
 
 #include <map>
 #include <memory>
-#include <mutex>
 #include <optional>
 #include <string>
 #include <vector>
 
+#include "base/mutex.h"
 #include "services/kovaelasticd/document.h"
 #include "services/kovaelasticd/file_links.h"
 #include "services/kovaelasticd/index_store.h"
@@ -92,8 +92,8 @@ class SqliteStore : public IndexStore {
   int64_t uncommitted_bytes_ = 0;
   bool in_transaction_ = false;
 
-  std::mutex readers_mutex_;
-  std::vector<std::unique_ptr<StoreReader>> readers_;
+  base::Mutex readers_mutex_;
+  std::vector<std::unique_ptr<StoreReader>> readers_ BASE_GUARDED_BY(readers_mutex_);
 };
 
 }  // namespace ferrox::engine
