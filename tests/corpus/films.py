@@ -7,7 +7,6 @@ import shutil
 import struct
 import tempfile
 
-import gray_film
 import tools
 
 MIMETYPE = "golang-github-gabriel-vasile-mimetype-dev"
@@ -164,22 +163,6 @@ def add_flash_and_avi(corpus):
             "KOVAMDPixelWidth": 320})
 
 
-def add_broadcasts(corpus):
-    for width, height, seconds in ((352, 288, 3), (720, 576, 2), (1280, 720, 1)):
-        fields = {"KOVAMDPixelWidth": width, "KOVAMDPixelHeight": height, "KOVAMDCodecs": "MPEG Video",
-                  "KOVAMDDurationSecond": tools.near(seconds, 0.05)}
-        program = gray_film.program_stream(width, height, seconds)
-        corpus.add(f"mpg/of_{seconds}_seconds.mpg", program, fields=fields, mime="video/mpeg")
-        corpus.add(f"mpg/of_{seconds}_seconds.vob", program, fields=fields, mime="video/mpeg")
-        for extension, times in (("ts", False), ("m2ts", True)):
-            packets = gray_film.transport_stream(width, height, seconds, times)
-            corpus.add(f"ts/of_{seconds}_seconds.{extension}", packets, fields=fields, mime="video/mp2t")
-    by_name = (("Real.rm", "rm", "application/vnd.rn-realmedia"), ("MXF.mxf", "mxf", "application/mxf"))
-    for name, extension, mime in by_name:
-        corpus.add(f"{extension}/by_name.{extension}", donor(corpus, "exiftool", name), mime=mime)
-    corpus.add("ts/no_film.ts", b"export const answer: number = 42; // in TypeScript\n", ["TypeScript"])
-
-
 def make(corpus):
     add_as_they_are(corpus)
     with tempfile.TemporaryDirectory() as work:
@@ -187,4 +170,3 @@ def make(corpus):
         add_of_phones(corpus, work)
     add_matroska(corpus)
     add_flash_and_avi(corpus)
-    add_broadcasts(corpus)

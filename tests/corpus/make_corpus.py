@@ -2,7 +2,8 @@
 """Makes the corpus, FOLDER/files, and what must be found in it, FOLDER/expected.json.
 
 Each subject is a module beside this one with a function make(corpus), and with a list DONORS of the packages that it
-takes files out of.
+takes files out of: films, photos and sound, which get texts in several languages and numbers that other programs tell, and
+listed, for all that is a file and what is known of it.
 """
 
 import argparse
@@ -152,9 +153,11 @@ def subjects():
 def fingerprint():
     """Of all that decides what the corpus is."""
     digest = hashlib.sha256()
-    for path in sorted(glob.glob(os.path.join(glob.escape(HERE), "*.py"))):
-        with open(path, "rb") as file:
-            digest.update(file.read())
+    for path in sorted(glob.glob(os.path.join(glob.escape(HERE), "*.*")) +
+                       glob.glob(os.path.join(glob.escape(HERE), "samples", "*", "*"))):
+        if os.path.isfile(path):
+            with open(path, "rb") as file:
+                digest.update(file.read())
     return digest.hexdigest()
 
 

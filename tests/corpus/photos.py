@@ -180,26 +180,6 @@ def add_older_texts(corpus):
         with open(plain, "rb") as file:
             old = file.read().replace(b"x" * 26, "Прогулка по берегу Финского".encode("cp1251")[:26])
         corpus.add("jpg/old_russian.jpg", old, ["берегу"])
-    for language, code_page in (("russian", "utf-8"), ("greek", "utf-8")):
-        comment = TEXTS[language][1].encode(code_page)
-        corpus.add(f"gif/film_{language}.gif", gif(48, 32, comment), TEXTS[language][1].split()[-1:],
-                   {"KOVAMDPixelWidth": 48, "KOVAMDPixelHeight": 32, "KOVAMDComment": TEXTS[language][1]})
-
-
-def gif(width, height, comment, pictures=3):
-    """A film of one colour a picture: the codes are as wide as at the beginning, since each 4th one begins anew."""
-    def pieces(data):
-        return b"".join(bytes([len(data[i:i + 255])]) + data[i:i + 255] for i in range(0, len(data), 255)) + b"\0"
-    bits, count = 0, 0
-    for i in range(width * height):
-        for code in ([4] if i % 2 == 0 else []) + [i % 2]:
-            bits |= code << count
-            count += 3
-    bits |= 5 << count
-    picture = b"," + struct.pack("<HHHHB", 0, 0, width, height, 0) + b"\2"
-    picture += pieces(bits.to_bytes(count // 8 + 1, "little"))
-    head = b"GIF89a" + struct.pack("<HHBBB", width, height, 0x91, 0, 0) + bytes(range(12))
-    return head + (b"!\xf9\4\0\x0a\0\0\0" + picture) * pictures + b"!\xfe" + pieces(comment) + b";"
 
 
 def add_png_texts(corpus):
@@ -214,25 +194,9 @@ def add_png_texts(corpus):
         "KOVAMDTitle": "Tåget i fjällen", "KOVAMDAuthors": "Åsa Öberg", "KOVAMDCreator": "Ritprogram"})
 
 
-def add_drawings(corpus):
-    """What is text in truth."""
-    drawing = """<?xml version="1.0" encoding="UTF-8"?>
-<svg xmlns="http://www.w3.org/2000/svg" width="200" height="50"><title>План этажа</title>
-<desc>Лестница слева</desc><text x="1" y="9">Переговорная</text><text x="1" y="30">кухня</text></svg>
-"""
-    corpus.add("svg/floor.svg", drawing.encode(), ["Переговорная", "кухня", "Лестница"], {"KOVAMDTitle": "План этажа"},
-               mime="image/svg+xml")
-    corpus.add("svg/report.svg", tools.sample(corpus, "XMP.svg"), ["widget", "growth"], mime="image/svg+xml")
-    badge = b'<svg xmlns="http://www.w3.org/2000/svg"><text>coverage <tspan>gedeckt</tspan></text></svg>'
-    corpus.add("svg/badge.svg", badge, ["gedeckt"], mime="image/svg+xml")
-    corpus.add("xmp/beside_a_picture.xmp", tools.sample(corpus, "XMP6.xmp"), ["title"], mime="application/rdf+xml")
-    corpus.add("xmp/canon.xmp", tools.sample(corpus, "XMP.xmp"), ["test1"], mime="application/rdf+xml")
-
-
 def make(corpus):
     add_as_they_are(corpus)
     add_with_texts(corpus)
     add_webp_with_texts(corpus)
     add_older_texts(corpus)
     add_png_texts(corpus)
-    add_drawings(corpus)

@@ -149,83 +149,11 @@ def add_old_tags(corpus, work):
     corpus.add("mp3/raw_chinese.mp3", path, fields=expected(texts))
 
 
-def samples(seconds=2, rate=8000):
-    """A saw of 16 bits, high byte first."""
-    return b"".join(struct.pack(">h", (i * 900) % 20000 - 10000) for i in range(seconds * rate))
-
-
-def au(note):
-    note = note.encode() + b"\0"
-    note += b"\0" * (-len(note) % 8)
-    return struct.pack(">4sIIIII", b".snd", 24 + len(note), len(samples()), 3, 8000, 1) + note + samples()
-
-
-def aiff(chunks):
-    def chunk(name, data):
-        return name + struct.pack(">I", len(data)) + data + b"\0" * (len(data) % 2)
-    rate = struct.pack(">HQ", 16383 + 12, 8000 << 51)
-    body = chunk(b"COMM", struct.pack(">hIh", 1, 16000, 16) + rate)
-    body += b"".join(chunk(name, text.encode()) for name, text in chunks) + chunk(b"SSND", b"\0" * 8 + samples())
-    return b"FORM" + struct.pack(">I", len(body) + 4) + b"AIFF" + body
-
-
-def caf(texts):
-    def chunk(name, data):
-        return name + struct.pack(">q", len(data)) + data
-    info = b"".join(name.encode() + b"\0" + text.encode() + b"\0" for name, text in texts)
-    return (b"caff\0\1\0\0" + chunk(b"desc", struct.pack(">d4sIIIII", 8000, b"lpcm", 0, 2, 1, 1, 16)) +
-            chunk(b"info", struct.pack(">I", len(texts)) + info) + chunk(b"data", b"\0" * 4 + samples()))
-
-
-def wav_with_info(texts):
-    def chunk(name, data):
-        return name + struct.pack("<I", len(data)) + data + b"\0" * (len(data) % 2)
-    body = b"WAVE" + chunk(b"fmt ", struct.pack("<HHIIHH", 1, 1, 8000, 16000, 2, 16))
-    body += chunk(b"LIST", b"INFO" + b"".join(chunk(name, text.encode() + b"\0") for name, text in texts))
-    return b"RIFF" + struct.pack("<I", len(body) + 8 + len(samples())) + body + chunk(b"data", samples())
-
-
-def dsf():
-    """Half a second of two channels, each of one bit, 2,822,400 times a second."""
-    bits = 1411200
-    data = b"\x69" * (-(-bits // 8 // 4096) * 4096 * 2)
-    head = b"DSD " + struct.pack("<QQQ", 28, 92 + len(data), 0)
-    form = b"fmt " + struct.pack("<QIIIIIIQII", 52, 1, 0, 2, 2, 2822400, 1, bits, 4096, 0)
-    return head + form + b"data" + struct.pack("<Q", 12 + len(data)) + data
-
-
-def add_made_here(corpus, work):
-    numbers = {"KOVAMDDurationSecond": tools.near(2), "KOVAMDAudioSampleRate": 8000, "KOVAMDAudioChannelCount": 1}
-    for language, (title, artist, album, genre, composer, comment) in TAGS.items():
-        named = {"KOVAMDTitle": title, "KOVAMDAuthors": artist}
-        lines = f"title={title}\nartist={artist}\nalbum={album}\ntrack=7"
-        corpus.add(f"au/{language}.au", au(lines), [album], dict(numbers, **named), mime="audio/basic")
-        texts = [("title", title), ("artist", artist), ("comments", comment)]
-        corpus.add(f"caf/{language}.caf", caf(texts), fields=dict(numbers, KOVAMDComment=comment, **named),
-                   mime="audio/x-caf")
-        corpus.add(f"aiff/chunks_{language}.aiff", aiff([(b"NAME", title), (b"AUTH", artist), (b"ANNO", comment)]),
-                   fields=dict(numbers, KOVAMDComment=comment, **named), mime=AIFF)
-        info = [(b"INAM", title), (b"IART", artist), (b"IGNR", genre), (b"ICMT", comment), (b"ICOP", composer)]
-        corpus.add(f"wav/info_{language}.wav", wav_with_info(info), fields=dict(
-            numbers, KOVAMDMusicalGenre=genre, KOVAMDCopyright=composer, KOVAMDCodecs="PCM", **named), mime=WAV)
-        path = f"{work}/{language}.dsf"
-        with open(path, "wb") as file:
-            file.write(dsf())
-        write_id3(corpus, path, TAGS[language])
-        corpus.add(f"dsf/{language}.dsf", path, fields=dict(expected(TAGS[language]), KOVAMDAudioSampleRate=2822400,
-                                                            KOVAMDDurationSecond=tools.near(0.5)), mime="audio/x-dsd")
-
-
 def make(corpus):
     with tempfile.TemporaryDirectory() as work:
         add_with_tags(corpus, work)
         add_old_tags(corpus, work)
-        add_made_here(corpus, work)
     for name in AS_THEY_ARE:
         path = donor(corpus, name)
         extension = os.path.splitext(name)[1][1:]
         corpus.add(f"{extension}/taglib_{name}", path, fields={} if name in NO_NUMBERS else numbers_of(corpus, path))
-    for name, title in (("test.mod", "title of song"), ("test.s3m", "test song name"), ("test.it", "test song name")):
-        corpus.add(f"mod/of_taglib_{name}", donor(corpus, name), fields={"KOVAMDTitle": title}, mime="audio/x-mod")
-    corpus.add("mp3/exiftool.mp3", tools.sample(corpus, "MP3.mp3"), ["bang"], {"KOVAMDTitle": "ExifTool Test",
-                                                                            "KOVAMDComposer": "A Composer"})

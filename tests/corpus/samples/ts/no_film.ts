@@ -1,0 +1,1 @@
+export const answer: number = 42; // in TypeScript
