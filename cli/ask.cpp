@@ -7,15 +7,14 @@
 #include "cli/rights.h"
 #include "common/error.h"
 #include "common/file_util.h"
-#include "common/json_util.h"
 #include "common/paths.h"
-#include "services/support/local_request.h"
+#include "wire/frame_client.h"
 
 namespace ferrox::cli {
 
 namespace {
 
-using services::RequestResult;
+using wire::Outcome;
 
 /// A command that must first wait for other work still answers within this.
 constexpr std::chrono::seconds kLongestWait(120);
@@ -34,91 +33,70 @@ constexpr Daemon kContentExtraction = {"content extraction", kContentExtractdSoc
 
 constexpr char kNoAnswer[] = "does not answer; see its log, or restart it ('fileindexctl down', 'up')";
 
-/// @throws Refusal.
-Json::Value DataOf(const Daemon& daemon, const std::string& text) {
-  Json::Value reply;
-  bool success = false;
-  if (!fromString(reply, text) || !reply.isObject()) {
-    throw Failure(std::string(daemon.name) +
-                  " gave an answer that cannot be read; restart it ('fileindexctl down', 'up')");
-  }
-  GetJsonValue(success, reply, "success", false);
-  if (success) return reply["data"];
-  int code = 0;
-  std::string message = "the request failed";
-  GetJsonValue(code, reply["error"], "code", false);
-  GetJsonValue(message, reply["error"], "msg", false);
-  if (code == Error::kEngineNotPermitted) throw MayNot("use", InstancePath(daemon.socket));
-  throw Refusal(daemon.name, code, message);
-}
-
-RequestResult Ask(const Daemon& daemon, const Json::Value& request, const std::string& end, std::string& reply,
-                  std::chrono::seconds longest = kLongestWait) {
-  return services::AskLocally(InstancePath(daemon.socket), toString(request) + end, longest, reply);
-}
-
-Json::Value Answer(const Daemon& daemon, RequestResult result, const std::string& reply) {
+/// The reply's data, or what the user can do about there being none.
+/// @throws Refusal, Failure, NotPermitted.
+Json::Value DataOf(const Daemon& daemon, wire::Reply reply) {
+  const std::string name = daemon.name;
   const std::string code = " (error " + std::to_string(daemon.unreachable) + ")";
-  if (result == RequestResult::kNotRunning) {
-    throw Failure(std::string(daemon.name) + " does not run here (nothing answers at " + InstancePath(daemon.socket) +
-                  "); start it with 'fileindexctl up'" + code);
+  switch (reply.outcome) {
+    case Outcome::kAnswered:
+      return std::move(reply.data);
+    case Outcome::kNotRunning:
+      throw Failure(name + " does not run here (nothing answers at " + InstancePath(daemon.socket) +
+                    "); start it with 'fileindexctl up'" + code);
+    case Outcome::kNotPermitted:
+      throw MayNot("use", InstancePath(daemon.socket));
+    case Outcome::kNoAnswer:
+    case Outcome::kPeerClosed:
+      throw Failure(name + " " + kNoAnswer + code);
+    case Outcome::kUnreadable:
+      throw Failure(name + " gave an answer that cannot be read; restart it ('fileindexctl down', 'up')");
+    case Outcome::kRefused:
+      break;
   }
-  if (result == RequestResult::kNotPermitted) throw MayNot("use", InstancePath(daemon.socket));
-  if (result == RequestResult::kNoAnswer) throw Failure(std::string(daemon.name) + " " + kNoAnswer + code);
-  return DataOf(daemon, reply);
+  if (reply.code == Error::kEngineNotPermitted) throw MayNot("use", InstancePath(daemon.socket));
+  throw Refusal(daemon.name, reply.code, reply.message.empty() ? "the request failed" : reply.message);
 }
 
 /// Of the daemons that take the library's commands.
-RequestResult SendCommand(const Daemon& daemon, const std::string& type, const Json::Value& data, std::string& reply,
-                          std::chrono::seconds longest = kLongestWait) {
-  Json::Value request;
-  request["type"] = type;
-  request["data"] = data;
-  return Ask(daemon, request, std::string(1, '\0'), reply, longest);
+wire::Reply SendCommand(const Daemon& daemon, const std::string& type, const Json::Value& data,
+                        std::chrono::seconds longest = kLongestWait) {
+  return wire::AskDaemon(daemon.socket, type, data, longest);
 }
 
-RequestResult SendToEngine(const std::string& command, const Json::Value& data, std::string& reply,
-                           std::chrono::seconds longest) {
+wire::Reply SendToEngine(const std::string& command, const Json::Value& data, std::chrono::seconds longest) {
   Json::Value request;
   request["command"] = command;
   request["data"] = data;
-  return Ask(kEngine, request, "", reply, longest);
+  return wire::AskEngine(request, longest);
 }
 
 Json::Value AskEngine(const std::string& command, const Json::Value& data, std::chrono::seconds longest) {
-  std::string reply;
-  const RequestResult result = SendToEngine(command, data, reply, longest);
-  return Answer(kEngine, result, reply);
+  return DataOf(kEngine, SendToEngine(command, data, longest));
 }
 
-DaemonState StateFrom(const Daemon& daemon, RequestResult result, const std::string& reply) try {
-  if (result == RequestResult::kNotRunning) return {};
-  if (result == RequestResult::kNoAnswer) return {Json::Value(), kNoAnswer};
-  return {Answer(daemon, result, reply), ""};
+DaemonState StateFrom(const Daemon& daemon, wire::Reply reply) try {
+  if (reply.outcome == Outcome::kNotRunning) return {};
+  if (reply.outcome == Outcome::kNoAnswer || reply.outcome == Outcome::kPeerClosed) return {Json::Value(), kNoAnswer};
+  return {DataOf(daemon, std::move(reply)), ""};
 } catch (const Failure& failure) {
   return {Json::Value(), failure.what()};
 }
 
 DaemonState EngineState() {
-  std::string reply;
-  const RequestResult result = SendToEngine("ping", Json::Value(Json::objectValue), reply, kStateWait);
-  return StateFrom(kEngine, result, reply);
+  return StateFrom(kEngine, SendToEngine("ping", Json::Value(Json::objectValue), kStateWait));
 }
 
 DaemonState StateOf(const Daemon& daemon) {
-  std::string reply;
-  const RequestResult result = SendCommand(daemon, "status", Json::Value(), reply, kStateWait);
-  return StateFrom(daemon, result, reply);
+  return StateFrom(daemon, SendCommand(daemon, "status", Json::Value(), kStateWait));
 }
 
 /// @throws Failure also when the daemon's answer comes much too late.
 Json::Value Sync(const Daemon& daemon, Json::Value data, std::chrono::milliseconds longest) {
   constexpr std::chrono::seconds kSlack(5);
   data["timeout_ms"] = Json::Int64(longest.count());
-  std::string reply;
-  const RequestResult result =
-      SendCommand(daemon, "sync", data, reply, std::chrono::duration_cast<std::chrono::seconds>(longest) + kSlack);
-  return Answer(daemon, result, reply);
+  return DataOf(daemon,
+                SendCommand(daemon, "sync", data, std::chrono::duration_cast<std::chrono::seconds>(longest) + kSlack));
 }
 
 /// Why the index daemon cannot say that the shares (none named: all) are up to date; "" when it does.
@@ -140,15 +118,12 @@ Json::Value AskEngine(const std::string& command, const Json::Value& data) {
 Json::Value Search(const Json::Value& data) { return AskEngine("search", data, kSearchWait); }
 
 Json::Value AskIndexDaemon(const std::string& type, const Json::Value& data) {
-  std::string reply;
-  const RequestResult result = SendCommand(kIndexDaemon, type, data, reply);
-  return Answer(kIndexDaemon, result, reply);
+  return DataOf(kIndexDaemon, SendCommand(kIndexDaemon, type, data));
 }
 
 Json::Value AskIndexDaemonIfRunning(const std::string& type, const Json::Value& data) {
-  std::string reply;
-  const RequestResult result = SendCommand(kIndexDaemon, type, data, reply);
-  return result == RequestResult::kNotRunning ? Json::Value() : Answer(kIndexDaemon, result, reply);
+  wire::Reply reply = SendCommand(kIndexDaemon, type, data);
+  return reply.outcome == Outcome::kNotRunning ? Json::Value() : DataOf(kIndexDaemon, std::move(reply));
 }
 
 InstanceState AskAll() {
@@ -166,7 +141,7 @@ InstanceState AskAll() {
 
 std::string NotNoticed() {
   for (const Daemon& daemon : {kNotificationDaemon, kIndexDaemon}) {
-    if (services::IsServed(InstancePath(daemon.socket))) continue;
+    if (wire::IsServed(InstancePath(daemon.socket))) continue;
     return std::string(daemon.name) + " does not run, so that what has changed since may be missing; start it with " +
            "'fileindexctl up'";
   }

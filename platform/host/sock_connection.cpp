@@ -11,10 +11,14 @@ SockConnection::~SockConnection() {
 }
 
 bool SockConnection::Send(const std::string& message) {
+  const SocketWait wait(fd_);
   return kova::SendFrame(fd_, message, message_limit_bytes_, kIdleTimeoutSec * 1000);
 }
 
-bool SockConnection::Recv(std::string& message) { return kova::RecvFrame(fd_, message, message_limit_bytes_); }
+bool SockConnection::Recv(std::string& message) {
+  const SocketWait wait(fd_);
+  return kova::RecvFrame(fd_, message, message_limit_bytes_);
+}
 
 bool DomainSockConnection::Connect() {
   if (fd_ >= 0) (void)close(fd_);

@@ -9,7 +9,6 @@
 #include <algorithm>
 #include <cerrno>
 #include <cstring>
-#include <utility>
 
 #include "platform/shared/failure.h"
 
@@ -19,20 +18,6 @@ namespace {
 
 constexpr size_t kReceiveStepBytes = 64 * 1024;
 constexpr int kConnectSec = 10;
-
-thread_local const SocketWaits* t_waits = nullptr;
-
-struct WaitScope {
-  explicit WaitScope(int socket) : fd(socket) {
-    if (t_waits != nullptr) t_waits->Begin(fd);
-  }
-  WaitScope(const WaitScope&) = delete;
-  WaitScope& operator=(const WaitScope&) = delete;
-  ~WaitScope() {
-    if (t_waits != nullptr) t_waits->End(fd);
-  }
-  const int fd;
-};
 
 /// Waits until the socket can be read or written; `timeout_ms` -1 waits for ever. A closed peer counts as ready.
 bool WaitFor(int fd, short events, int timeout_ms) {
@@ -122,8 +107,6 @@ bool Fail() {
 
 }  // namespace
 
-const SocketWaits* SetSocketWaits(const SocketWaits* waits) { return std::exchange(t_waits, waits); }
-
 int ConnectUnixSocket(const std::string& path) {
   sockaddr_un address = {};
   address.sun_family = AF_UNIX;
@@ -152,14 +135,12 @@ bool SendFrame(int fd, const std::string& message, uint32_t limit_bytes, int idl
     return Fail();
   }
   const auto length = static_cast<uint32_t>(message.size());
-  const WaitScope wait(fd);
   Outgoing frame = {{}, message, descriptor};
   memcpy(frame.header, &length, sizeof(length));
   return SendAll(fd, frame, idle_timeout_ms) || Fail();
 }
 
 bool RecvFrame(int fd, std::string& message, uint32_t limit_bytes, int idle_timeout_ms) {
-  const WaitScope wait(fd);
   message.clear();
   uint32_t length = 0;
   char header[sizeof(length)];

@@ -6,16 +6,6 @@
 /// Whole messages over a connected socket: a 4-byte length in host byte order, then that many bytes.
 namespace kova {
 
-/// Told of each socket on which a thread waits for a peer, so that another thread may end the wait by shutting it down.
-class SocketWaits {
- public:
-  virtual ~SocketWaits() = default;
-  virtual void Begin(int fd) const = 0;
-  virtual void End(int fd) const = 0;
-};
-/// Whom the calling thread tells from now on, or null. @return whom it told before.
-const SocketWaits* SetSocketWaits(const SocketWaits* waits);
-
 /// A stream socket connected to the Unix-domain socket at `path`, or -1 with the failure recorded, also when the peer
 /// takes no connection for 10 s.
 int ConnectUnixSocket(const std::string& path);

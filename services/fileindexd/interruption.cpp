@@ -1,7 +1,5 @@
 #include "services/fileindexd/interruption.h"
 
-#include <sys/socket.h>
-
 namespace ferrox::indexd {
 
 namespace {
@@ -11,35 +9,18 @@ thread_local const Interruption* t_interruption = nullptr;
 }  // namespace
 
 void Interruption::Request() {
-  const std::lock_guard lock(mutex_);
+  const base::MutexLock lock(mutex_);
   requested_ = true;
-  changed_.notify_all();
+  changed_.NotifyAll();
 }
 
 void Interruption::Clear() {
-  const std::lock_guard lock(mutex_);
+  const base::MutexLock lock(mutex_);
   requested_ = false;
 }
 
-void Interruption::CutWaits() {
-  const std::lock_guard lock(mutex_);
-  cuts_ = true;
-  for (const int fd : sockets_) (void)shutdown(fd, SHUT_RDWR);
-}
-
-void Interruption::Begin(int fd) const {
-  const std::lock_guard lock(mutex_);
-  sockets_.insert(fd);
-  if (cuts_) (void)shutdown(fd, SHUT_RDWR);
-}
-
-void Interruption::End(int fd) const {
-  const std::lock_guard lock(mutex_);
-  sockets_.erase(fd);
-}
-
 bool Interruption::Requested() const {
-  const std::lock_guard lock(mutex_);
+  const base::MutexLock lock(mutex_);
   return requested_;
 }
 
@@ -48,19 +29,20 @@ void Interruption::Check() const {
 }
 
 void Interruption::SleepFor(std::chrono::milliseconds duration) const {
-  std::unique_lock lock(mutex_);
-  if (changed_.wait_for(lock, duration, [this] { return requested_; })) throw Interrupted();
+  const auto end = std::chrono::steady_clock::now() + duration;
+  const base::MutexLock lock(mutex_);
+  while (!requested_) {
+    if (!changed_.WaitUntil(mutex_, end)) break;
+  }
+  if (requested_) throw Interrupted();
 }
 
 InterruptionScope::InterruptionScope(const Interruption& interruption)
-    : before_(t_interruption), waits_before_(kova::SetSocketWaits(&interruption)) {
+    : before_(t_interruption), waits_(interruption.waits_) {
   t_interruption = &interruption;
 }
 
-InterruptionScope::~InterruptionScope() {
-  t_interruption = before_;
-  (void)kova::SetSocketWaits(waits_before_);
-}
+InterruptionScope::~InterruptionScope() { t_interruption = before_; }
 
 void InterruptibleClock::SleepFor(std::chrono::milliseconds duration) {
   if (t_interruption == nullptr) return Clock::SleepFor(duration);

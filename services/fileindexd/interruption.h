@@ -1,13 +1,11 @@
 #pragma once
 
 #include <chrono>
-#include <condition_variable>
 #include <exception>
-#include <mutex>
-#include <set>
 
+#include "base/mutex.h"
 #include "common/clock.h"
-#include "platform/shared/frames.h"
+#include "wire/cancellation.h"
 
 namespace ferrox::indexd {
 
@@ -17,28 +15,29 @@ class Interrupted : public std::exception {
   const char* what() const noexcept override { return "interrupted"; }
 };
 
-/// Asks work in other threads to stop soon.
-class Interruption : public kova::SocketWaits {
+/// Asks work in other threads to stop soon: a request that the work finds at its next Check or sleep, and that can be
+/// taken back; and, for a worker that ends for good, a cut of what it waits for from other daemons. Any thread may call
+/// any of its functions.
+class Interruption {
  public:
   void Request();
   void Clear();
-  /// Ends the waits for other daemons, too, now and from now on: one of them may never answer.
-  void CutWaits();
   bool Requested() const;
   /// @throws Interrupted when it was requested.
   void Check() const;
   /// Sleeps, at most until it is requested. @throws Interrupted then.
   void SleepFor(std::chrono::milliseconds duration) const;
 
- private:
-  void Begin(int fd) const override;
-  void End(int fd) const override;
+  /// Ends the waits for other daemons, too, now and from now on: one of them may never answer.
+  void CutWaits() { waits_.Cancel(); }
 
-  mutable std::mutex mutex_;
-  mutable std::condition_variable changed_;
-  mutable std::set<int> sockets_;  ///< on which threads wait
-  bool requested_ = false;
-  bool cuts_ = false;
+ private:
+  friend class InterruptionScope;
+
+  mutable base::Mutex mutex_;
+  mutable base::ConditionVariable changed_;
+  bool requested_ BASE_GUARDED_BY(mutex_) = false;
+  wire::Cancellation waits_;
 };
 
 /// Makes an interruption the calling thread's while it lives: the process's InterruptibleClock then wakes that thread
@@ -53,7 +52,7 @@ class InterruptionScope {
 
  private:
   const Interruption* before_;
-  const kova::SocketWaits* waits_before_;
+  wire::CancellationScope waits_;
 };
 
 /// The process's clock while it lives.

@@ -5,10 +5,9 @@
 #include "common/file_util.h"
 #include "common/json_util.h"
 #include "common/log.h"
-#include "common/paths.h"
 #include "fileindex/elastic/comm.h"
 #include "fileindex/elastic/elastic_control.h"
-#include "services/support/local_request.h"
+#include "wire/frame_client.h"
 
 namespace ferrox::indexd {
 
@@ -46,15 +45,6 @@ void ThrowIfFailed(const Json::Value& part) {
   GetJsonValue(code, part["error"], "code", true);
   GetJsonValue(message, part["error"], "msg", true);
   throw Error(static_cast<Error::ErrorCode>(code), message);
-}
-
-/// An object; null when it does not answer within `longest`.
-Json::Value AskEngine(const Json::Value& request, std::chrono::milliseconds longest) {
-  std::string text;
-  Json::Value reply;
-  const auto result = services::AskLocally(InstancePath(kElasticdSocket), toString(request), longest, text);
-  const bool answered = result == services::RequestResult::kAnswered && fromString(reply, text) && reply.isObject();
-  return answered ? reply : Json::Value();
 }
 
 class Engine : public ShareIndex {
@@ -150,10 +140,10 @@ class Engine : public ShareIndex {
   }
 
   Json::Value Figures(std::chrono::milliseconds longest) override {
-    const Json::Value reply = AskEngine(Request("index_stat"), longest);
-    if (reply.isNull() || reply["success"] == true) return reply.isNull() ? reply : reply["data"];
+    wire::Reply reply = wire::AskEngine(Request("index_stat"), longest);
+    if (reply.outcome != wire::Outcome::kRefused) return std::move(reply.data);
     Json::Value refused;
-    refused["error"] = reply["error"];
+    refused["error"] = std::move(reply.error);
     return refused;
   }
 
@@ -203,9 +193,9 @@ std::vector<std::string> SharesBeingRebuilt() {
   request["data"]["figures"] = false;
   const std::string prefix = elastic::GetFileIndexID("");
   std::vector<std::string> shares;
-  const Json::Value reply = AskEngine(request, std::chrono::seconds(2));
-  if (!reply.isObject() || !reply["data"].isArray()) return shares;
-  for (const Json::Value& index : reply["data"]) {
+  const wire::Reply reply = wire::AskEngine(request, std::chrono::seconds(2));
+  if (!reply.data.isArray()) return shares;
+  for (const Json::Value& index : reply.data) {
     std::string id;
     GetJsonValue(id, index, "id", false);
     if (index.isMember("rebuilding") && StringStartWith(id, prefix)) shares.push_back(id.substr(prefix.size()));

@@ -21,6 +21,7 @@
 #include <kova/content_extract.h>
 #include <kova/instance.h>
 #include <kova/service.h>
+#include <kova/sock_connection.h>
 
 #include "platform/host/child_service.h"
 #include "platform/host/files.h"
@@ -84,11 +85,7 @@ class Channel {
   std::optional<std::string> Ask(const std::string& request) {
     if (!IsOpen() && !Open()) return std::nullopt;
     std::string reply;
-    const int descriptor = std::exchange(told_, true) ? -1 : memory_;
-    if (kova::SendFrame(socket_, request, kMessageMaxBytes, kSendMaxMs, descriptor) &&
-        kova::RecvFrame(socket_, reply, kMessageMaxBytes)) {
-      return reply;
-    }
+    if (Exchange(request, reply)) return reply;
     Close();
     return std::nullopt;
   }
@@ -100,6 +97,13 @@ class Channel {
   }
 
  private:
+  bool Exchange(const std::string& request, std::string& reply) {
+    const kovadaemon::SocketWait wait(socket_);
+    const int descriptor = std::exchange(told_, true) ? -1 : memory_;
+    return kova::SendFrame(socket_, request, kMessageMaxBytes, kSendMaxMs, descriptor) &&
+           kova::RecvFrame(socket_, reply, kMessageMaxBytes);
+  }
+
   /// The daemon ends what has been idle for long; that is readable here.
   bool IsOpen() {
     pollfd state = {socket_, POLLIN, 0};

@@ -3,9 +3,37 @@
 #include <cstdint>
 #include <string>
 
+/// Connections to the daemons of this host. A message is a frame: a 4-byte length in host byte order, then that many
+/// bytes. A failed call records its reason for KLIBCErrGet.
 namespace kovadaemon {
 
-/// A stream socket that carries whole messages: a 4-byte length in host byte order, then that many bytes.
+/// Learns on which sockets threads wait for a peer, so that another thread can end such a wait by shutting the socket
+/// down. Its functions are called by the waiting threads, several at once.
+class __attribute__((visibility("default"))) SocketWaits {
+ public:
+  virtual ~SocketWaits();
+  virtual void Begin(int fd) const = 0;  ///< the calling thread is about to wait; `fd` stays open until End
+  virtual void End(int fd) const = 0;
+};
+
+/// Reports the waits of the calling thread to `waits` from now on, to nobody when null: those of this interface's
+/// connections and of content extraction. @return what they were reported to before.
+__attribute__((visibility("default"))) const SocketWaits* SetSocketWaits(const SocketWaits* waits);
+
+/// Reports one wait of the calling thread while it lives; for those who wait on sockets of their own.
+class __attribute__((visibility("default"))) SocketWait {
+ public:
+  explicit SocketWait(int fd);
+  SocketWait(const SocketWait&) = delete;
+  SocketWait& operator=(const SocketWait&) = delete;
+  ~SocketWait();
+
+ private:
+  const SocketWaits* waits_;
+  int fd_;
+};
+
+/// One connection that carries whole messages. Belongs to one thread.
 class __attribute__((visibility("default"))) SockConnection {
  public:
   SockConnection() = default;

@@ -1,0 +1,98 @@
+#include "wire/frame_client.h"
+
+#include <cerrno>
+
+#include <kova/sock_connection.h>
+
+#include "common/json_util.h"
+#include "common/paths.h"
+#include "platform/shared/frames.h"
+
+namespace ferrox::wire {
+
+namespace {
+
+constexpr uint32_t kMessageMaxBytes = 256U << 20;
+constexpr int kSendIdleMs = 60000;
+
+/// Only a socket that is missing or that nobody serves is that of a daemon that does not run.
+Outcome WhyNotConnected(int error) {
+  if (error == ENOENT || error == ENOTDIR || error == ECONNREFUSED) return Outcome::kNotRunning;
+  return error == EACCES || error == EPERM ? Outcome::kNotPermitted : Outcome::kNoAnswer;
+}
+
+/// What the call that just failed left in errno; 0 for the end of the stream.
+Outcome WhyCutShort(int error) {
+  if (error == ETIMEDOUT) return Outcome::kNoAnswer;
+  return error == EMSGSIZE ? Outcome::kUnreadable : Outcome::kPeerClosed;
+}
+
+Outcome Exchange(FrameClient& client, const std::string& request, std::string& reply,
+                 std::chrono::milliseconds longest) {
+  Outcome outcome = client.Connect();
+  if (outcome == Outcome::kAnswered) outcome = client.Send(request);
+  return outcome == Outcome::kAnswered ? client.Receive(reply, longest) : outcome;
+}
+
+/// A reply without "success" refuses the request, as one with a false one does.
+Reply ReadReply(const std::string& text) {
+  Json::Value json;
+  Reply reply;
+  reply.outcome = Outcome::kUnreadable;
+  if (!fromString(json, text) || !json.isObject()) return reply;
+  const Json::Value& success = json["success"];
+  reply.outcome = isJsonType<bool>(success) && asJsonType<bool>(success) ? Outcome::kAnswered : Outcome::kRefused;
+  if (reply.outcome == Outcome::kAnswered) {
+    reply.data = std::move(json["data"]);
+    return reply;
+  }
+  reply.error = std::move(json["error"]);
+  if (!reply.error.isObject()) return reply;
+  GetJsonValue(reply.code, reply.error, "code", false);
+  GetJsonValue(reply.message, reply.error, "msg", false);
+  return reply;
+}
+
+Reply Ask(const char* socket, const std::string& request, std::chrono::milliseconds longest) {
+  FrameClient client(InstancePath(socket));
+  std::string text;
+  Reply reply;
+  reply.outcome = Exchange(client, request, text, longest);
+  return reply.outcome == Outcome::kAnswered ? ReadReply(text) : reply;
+}
+
+}  // namespace
+
+Outcome FrameClient::Connect() {
+  socket_ = base::UniqueFd(kova::ConnectUnixSocket(socket_path_));
+  return socket_.Valid() ? Outcome::kAnswered : WhyNotConnected(errno);
+}
+
+Outcome FrameClient::Send(const std::string& message) {
+  const kovadaemon::SocketWait wait(socket_.Get());
+  if (kova::SendFrame(socket_.Get(), message, kMessageMaxBytes, kSendIdleMs)) return Outcome::kAnswered;
+  return WhyCutShort(errno);
+}
+
+Outcome FrameClient::Receive(std::string& message, std::chrono::milliseconds longest) {
+  const kovadaemon::SocketWait wait(socket_.Get());
+  const auto longest_ms = static_cast<int>(longest.count());
+  if (kova::RecvFrame(socket_.Get(), message, kMessageMaxBytes, longest_ms)) return Outcome::kAnswered;
+  return WhyCutShort(errno);
+}
+
+Reply AskEngine(const Json::Value& request, std::chrono::milliseconds longest) {
+  return Ask(kElasticdSocket, toString(request), longest);
+}
+
+Reply AskDaemon(const char* socket, const std::string& type, const Json::Value& data,
+                std::chrono::milliseconds longest) {
+  Json::Value request;
+  request["type"] = type;
+  request["data"] = data;
+  return Ask(socket, toString(request) + '\0', longest);
+}
+
+bool IsServed(const std::string& socket_path) { return FrameClient(socket_path).Connect() != Outcome::kNotRunning; }
+
+}  // namespace ferrox::wire
