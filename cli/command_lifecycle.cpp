@@ -15,6 +15,7 @@
 #include "fileindex/elastic/elastic_control.h"
 #include "fileindex/folders/folder_mgr.h"
 #include "fileindex/operations/index_mgr.h"
+#include "fileindex/operations/operation_error.h"
 #include "fileindex/queue/queue_file.h"
 #include "sdk/share.h"
 
@@ -62,6 +63,13 @@ void RequireRenamed(const std::string& old_name, const std::string& new_name) {
   }
 }
 
+/// Makes the index that an operation stopped for. @throws OperationError, as the operation is not done then.
+void MakeIndex(const std::string& share, const fileindex::OperationError& stopped) try {
+  fileindex::elastic::ShareIndexCreate(share);
+} catch (const Error& error) {
+  throw fileindex::OperationError(error, stopped.NotDone());
+}
+
 /// The index of a share that is indexed at this moment is not dropped by mistake.
 void RefuseActive(const std::string& share) {
   const FolderMgr configured;
@@ -89,10 +97,10 @@ int RunShareResume(const Arguments& arguments) {
   const auto resume = [&] {
     try {
       fileindex::ShareResume(name);
-    } catch (const Error& error) {
+    } catch (const fileindex::OperationError& stopped) {
       // The engine has lost its list of indices: it finds the index in its folder, or makes an empty one.
-      if (error.Code() != Error::kEngineNoSuchIndex) throw;
-      fileindex::elastic::ShareIndexCreate(name);
+      if (stopped.Code() != Error::kEngineNoSuchIndex) throw;
+      MakeIndex(name, stopped);
       fileindex::ShareResume(name);
     }
   };

@@ -2,17 +2,15 @@
 
 #include <algorithm>
 #include <cstdio>
-#include <cstring>
 #include <set>
 
-#include "base/scope_exit.h"
 #include "cli/command.h"
 #include "cli/escape.h"
 #include "cli/explain.h"
 #include "common/file_util.h"
-#include "common/log.h"
 #include "common/paths.h"
 #include "fileindex/folders/folder_mgr.h"
+#include "fileindex/operations/operation_error.h"
 #include "fileindex/queue/queue_file.h"
 #include "fileindex/status_mgr.h"
 #include "sdk/share.h"
@@ -20,18 +18,6 @@
 namespace ferrox::cli {
 
 namespace {
-
-constexpr char kNotDone[] = "Not done: ";
-
-std::string g_not_done;
-LogSink g_log = nullptr;
-
-/// The log's line about the steps that a failed operation has not got to; it goes on into the log, like all.
-void NoteNotDone(int priority, const char* line) {
-  const char* found = strstr(line, kNotDone);
-  if (found != nullptr) g_not_done = found + sizeof(kNotDone) - 1;
-  g_log(priority, line);
-}
 
 std::string FoldersFile() {
   std::string content;
@@ -43,12 +29,11 @@ std::string FoldersFile() {
 
 void ChangeConfiguration(const std::function<void()>& change) {
   const std::string before = FoldersFile();
-  g_log = SetLogSink(&NoteNotDone);
-  const base::ScopeExit restore([] { (void)SetLogSink(g_log); });
   try {
     change();
   } catch (const Error& error) {
-    std::string note = g_not_done.empty() ? "" : "not done: " + g_not_done + "; ";
+    const auto* stopped = dynamic_cast<const fileindex::OperationError*>(&error);
+    std::string note = stopped == nullptr ? "" : "not done: " + stopped->NotDoneText() + "; ";
     note += FoldersFile() == before
                 ? "the list of indexed folders is as it was"
                 : "the list of indexed folders is changed, but the index may not follow: run 'fileindexctl up', then "

@@ -9,6 +9,7 @@
 #include <kova/lock_holder.h>
 
 #include "common/file_util.h"
+#include "common/subject_error.h"
 #include "fileindex/util.h"
 #include "platform/host/share_table.h"
 #include "sdk/share.h"
@@ -38,35 +39,29 @@ constexpr Remedy kRemedies[] = {
     {Error::kEngineStorage, "make room where the index lies, then try again"},
 };
 
-constexpr char kNotIndexable[] = "Path cannot index: ";
-
-/// What the library's own words for a failed call mean.
-struct Meaning {
-  const char* begin;
+/// What the library failed to do, in words for people; the subject's name follows.
+struct Wording {
+  Subject::Kind about;
   const char* text;
 };
-constexpr Meaning kMeanings[] = {
-    {"Request failed, msg=", "the search engine: "},
-    {"MonitorQueue::Upsert failed, share=", "the notification daemon's list cannot be given the folders of share "},
-    {"MonitorQueue::Delete failed, share=", "the notification daemon's list cannot be rid of the folders of share "},
-    {"KOVAShareNamePathGet failed, full_path=", "this lies in no share: "},
-    {"FILEIDXQueuePathCompose failed, share_path=", "no queue can be had for the folder "},
-    {"FILEIDXDBPathCompose failed, share_path=", "no index can be had for the folder "},
-    {"KLIBShareEnum failed", "the shares cannot be listed"},
-    {"Connect failed", "the search engine cannot be reached"},
-    {"Send failed", "the search engine does not take the request"},
-    {"Recv failed", "the search engine gives no answer that can be used"},
-    {"Cannot load json: ", "cannot be read or is damaged: "},
+constexpr Wording kWordings[] = {
+    {Subject::kShares, "the shares cannot be listed"},
+    {Subject::kShareOfPath, "this lies in no share: "},
+    {Subject::kQueuePlace, "no queue can be had for the folder "},
+    {Subject::kIndexPlace, "no index can be had for the folder "},
+    {Subject::kWatching, "the notification daemon's list cannot be given the folders of share "},
+    {Subject::kWatchingEnd, "the notification daemon's list cannot be rid of the folders of share "},
+    {Subject::kEngineConnect, "the search engine cannot be reached"},
+    {Subject::kEngineSend, "the search engine does not take the request"},
+    {Subject::kEngineReply, "the search engine gives no answer that can be used"},
+    {Subject::kEngineRefusal, "the search engine: "},
+    {Subject::kJson, ""},  // the library's own words, without the text that they are about
 };
 
-/// Without the JSON text that some of the library's reasons end in.
-std::string PlainReason(const Error& error) {
-  const std::string reason = error.what();
-  for (const Meaning& meaning : kMeanings) {
-    const std::string begin = meaning.begin;
-    if (StringStartWith(reason, begin)) return meaning.text + (begin.back() == 'd' ? "" : reason.substr(begin.size()));
-  }
-  return reason.substr(0, reason.find(", data="));
+/// What was wrong with a file of the configuration: the code says which of three things was done with it.
+std::string FileWording(const Error& error) {
+  if (error.Code() == Error::kLoadFailed) return "cannot be read or is damaged: ";
+  return error.Code() == Error::kSaveFailed ? "cannot write " : "cannot change the mode of ";
 }
 
 /// What is wrong with the settings that the failed step needed; empty when nothing is.
@@ -84,10 +79,14 @@ std::string SettingsProblem(const Error& error) {
   }
 }
 
-/// The library gives some of its reasons as a bare name or path.
+/// What went wrong. The library gives some of its reasons as a bare name.
 std::string Sentence(const Error& error) {
-  const std::string reason = PlainReason(error);
-  const bool is_path = StringStartWith(reason, "/");
+  const Subject subject = SubjectError::Of(error);
+  if (subject.kind == Subject::kFile) return FileWording(error) + subject.name;
+  for (const Wording& wording : kWordings) {
+    if (wording.about == subject.kind) return wording.text + subject.name;
+  }
+  const std::string reason = error.what();
   switch (error.Code()) {
     case Error::kNoSuchShare:
       return "there is no share \"" + reason + "\"";
@@ -95,35 +94,27 @@ std::string Sentence(const Error& error) {
       return reason + " is no indexed folder";
     case Error::kTooManyFolders:
       return "there would be too many indexed folders: at most 1000";
-    case Error::kSaveFailed:
-      return is_path ? "cannot write " + reason : reason;
-    case Error::kInternal:
-      return is_path ? "cannot change the mode of " + reason : reason;
     default:
       return reason.empty() ? "that did not work" : reason;
   }
 }
 
-bool IsDaemonChannel(const std::string& reason) {
-  return StringStartWith(reason, "write failed") || StringStartWith(reason, "read failed");
-}
-
-/// Of a lock that was waited for in vain.
-std::string HolderOf(const std::string& reason) {
-  const size_t path = reason.rfind("path=");
-  const std::string holder = path == std::string::npos ? "" : kova::LockHolderText(reason.substr(path + 5));
+/// Of a lock that was waited for in vain; empty when nobody holds it any more.
+std::string HolderOf(const std::string& lock_path) {
+  const std::string holder = kova::LockHolderText(lock_path);
   return holder.empty() ? "" : holder + "; end it if it hangs, and try again";
 }
 
 std::string RemedyFor(const Error& error) {
-  const std::string reason = error.what();
-  if (error.Code() == Error::kLockFailed && !HolderOf(reason).empty()) return HolderOf(reason);
-  if (error.Code() == Error::kPathNotIndexable && StringStartWith(reason, kNotIndexable)) {
-    return WhyNotIndexable(reason.substr(sizeof(kNotIndexable) - 1));
+  const Subject subject = SubjectError::Of(error);
+  const std::string holder = subject.kind == Subject::kLock ? HolderOf(subject.name) : "";
+  if (!holder.empty()) return holder;
+  if (error.Code() == Error::kPathNotIndexable && subject.kind == Subject::kFolder) {
+    return WhyNotIndexable(subject.name);
   }
   if (error.Code() == Error::kInternal) {
-    return IsDaemonChannel(reason) ? "the index daemon does not answer; 'fileindexctl up' starts it"
-                                   : "the system log says more";
+    return subject.kind == Subject::kDaemonChannel ? "the index daemon does not answer; 'fileindexctl up' starts it"
+                                                   : "the system log says more";
   }
   for (const Remedy& remedy : kRemedies) {
     if (remedy.code == error.Code()) return remedy.text;

@@ -13,7 +13,8 @@ namespace ferrox::cli {
 std::string QueueOf(const std::string& share_path) {
   std::string path = fileindex::ComposeQueuePath(share_path);
   FERROX_FAIL_IF_AS(path.empty(), "0 > FILEIDXQueuePathCompose(share_path.c_str(), path, sizeof(path))",
-                    Error::kInternal, "FILEIDXQueuePathCompose failed, share_path=" + share_path);
+                    Error::kInternal, "FILEIDXQueuePathCompose failed, share_path=" + share_path,
+                    Subject{Subject::kQueuePlace, share_path});
   return path;
 }
 

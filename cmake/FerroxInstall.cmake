@@ -14,6 +14,7 @@ install(DIRECTORY ${CMAKE_SOURCE_DIR}/base ${CMAKE_SOURCE_DIR}/common ${CMAKE_SO
         FILES_MATCHING PATTERN "*.h")
 foreach(header fileindex/folder fileindex/folder_mgr fileindex/index_mgr fileindex/optree fileindex/queue_mgr fileindex/status_mgr fileindex/util
         fileindex/watch_list fileindex/folders/folder fileindex/folders/folder_mgr fileindex/operations/index_mgr
+        fileindex/operations/operation_error
         fileindex/operations/watch_list fileindex/optree/optree fileindex/queue/event fileindex/queue/queue_mgr fileindex/elastic/comm
         fileindex/elastic/elastic_control fileindex/elastic/fields wire/fields)
   get_filename_component(folder ${header} DIRECTORY)

@@ -89,7 +89,7 @@ void BufferWrite(int fd, unsigned int size, const unsigned char* buffer) {
       continue;
     }
     FERROX_FAIL_IF(errno != EINTR || ++interruptions > kInterruptionsMax, Error::kInternal,
-                   "write failed, reason=" + ErrnoText());
+                   "write failed, reason=" + ErrnoText(), Subject{Subject::kDaemonChannel, ""});
   }
 }
 
@@ -99,7 +99,7 @@ void BufferRead(int fd, unsigned int size, unsigned char* buffer) {
     const ssize_t got = read(fd, buffer, std::min(size, kPieceBytes));
     if (got == -1) {
       FERROX_FAIL_IF(errno != EINTR || ++interruptions > kInterruptionsMax, Error::kInternal,
-                     "read failed, reason=" + ErrnoText());
+                     "read failed, reason=" + ErrnoText(), Subject{Subject::kDaemonChannel, ""});
       continue;
     }
     buffer += got;

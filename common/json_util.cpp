@@ -66,7 +66,8 @@ std::unique_ptr<Json::CharReader> NewReader() {
 }
 
 [[noreturn]] void FailReading(const char* condition, int line, const std::string& reason, const Json::Value& object) {
-  Fail({FERROX_SOURCE, line, "GetJsonValue", condition}, errno, Error::kBadArgument, reason + AppendData(object));
+  Fail({FERROX_SOURCE, line, "GetJsonValue", condition}, errno, Error::kBadArgument, reason + AppendData(object),
+       {Subject::kJson, reason});
 }
 
 /// The member of that name, or null when `object` has none.

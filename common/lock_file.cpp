@@ -71,7 +71,8 @@ LockFile::LockFile(const std::string& path, bool exclusive) : path_(path) {
     if (!locked) WaitForNextAttempt();
   }
   LogHolder(path_);
-  FERROX_FAIL_IF_AS(true, "kAttempts <= attempt", Error::kLockFailed, "Exceed max retry, path=" + path_);
+  FERROX_FAIL_IF_AS(true, "kAttempts <= attempt", Error::kLockFailed, "Exceed max retry, path=" + path_,
+                    Subject{Subject::kLock, path_});
 }
 
 std::unique_ptr<LockFile> LockFile::Try(const std::string& path, bool exclusive) {

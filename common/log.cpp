@@ -57,6 +57,12 @@ void Fail(const FailSite& site, int saved_errno, Error::ErrorCode code, const st
   throw Error(code, reason);
 }
 
+void Fail(const FailSite& site, int saved_errno, Error::ErrorCode code, const std::string& reason,
+          const Subject& subject) {
+  LogFailure(site, saved_errno, reason);
+  throw SubjectError(code, reason, subject);
+}
+
 std::string ErrnoSuffix() { return errno == 0 ? std::string() : " [err: " + ErrnoText() + "]"; }
 
 std::string ErrnoText() {

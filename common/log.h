@@ -4,6 +4,7 @@
 
 #include "common/error.h"
 #include "common/export.h"
+#include "common/subject_error.h"
 
 namespace ferrox {
 
@@ -34,6 +35,9 @@ FERROX_EXPORT void LogFailure(const FailSite& site, int saved_errno, const std::
 /// LogFailure, then throws Error(code, reason).
 [[noreturn, gnu::cold]] FERROX_EXPORT void Fail(const FailSite& site, int saved_errno, Error::ErrorCode code,
                                                 const std::string& reason = {});
+/// The same, but throws SubjectError(code, reason, subject).
+[[noreturn, gnu::cold]] FERROX_EXPORT void Fail(const FailSite& site, int saved_errno, Error::ErrorCode code,
+                                                const std::string& reason, const Subject& subject);
 
 /// " [err: <text of the present errno>]", "" when it is 0: the end of a line that reports a failure.
 FERROX_EXPORT std::string ErrnoSuffix();
@@ -47,7 +51,8 @@ FERROX_EXPORT std::string ErrnoText();
 #define FERROX_SOURCE __FILE__
 #endif
 
-/// Logs the failure line for `condition` and throws Error(code, reason...) when it holds. The line shows `text`, for
+/// Logs the failure line for `condition` and throws Error(code, reason...) when it holds; with a Subject as the last
+/// argument, the SubjectError of it. The line shows `text`, for
 /// conditions that the log names otherwise than the source does.
 #define FERROX_FAIL_IF_AS(condition, text, code, ...)                                                                 \
   do {                                                                                                                \

@@ -52,7 +52,7 @@ StatusMgr::StatusMgr() {
   const std::string path = StatusPath();
   FERROX_FAIL_IF_AS(IsFileExist(path) && !ReadStatus(data_, path),
                     "IsFileExist(kFileIndexStatusCfgPath) && !data_.fromFile(kFileIndexStatusCfgPath)",
-                    Error::kLoadFailed, "Cannot load json: " + path);
+                    Error::kLoadFailed, "Cannot load json: " + path, Subject{Subject::kFile, path});
 }
 
 long long StatusMgr::GetPauseInfo() const {

@@ -74,7 +74,8 @@ void GetShareNamePathByFullPath(std::string& share_name, std::string& share_path
   {
     const LockMutex guard(sdk::SDKMutex());
     FERROX_FAIL_IF(0 > KOVAShareNamePathGet(full_path.c_str(), name, sizeof(name), path, sizeof(path)),
-                   Error::kInternal, "KOVAShareNamePathGet failed, full_path=" + full_path);
+                   Error::kInternal, "KOVAShareNamePathGet failed, full_path=" + full_path,
+                   Subject{Subject::kShareOfPath, full_path});
   }
   share_name = name;
   share_path = path;

@@ -117,7 +117,8 @@ std::vector<std::string> SDKShare::Enum() {
   const KOVAShareFilter every_share = {};
   const int result = KLIBShareEnum(&list, &every_share);
   const std::unique_ptr<KLIBCSzList, ListFree> owner(list);  // only now: the list may have moved
-  FERROX_FAIL_IF_AS(0 > result, "0 > KLIBShareEnum(&list, &filter)", Error::kShareEnumFailed, "KLIBShareEnum failed");
+  FERROX_FAIL_IF_AS(0 > result, "0 > KLIBShareEnum(&list, &filter)", Error::kShareEnumFailed, "KLIBShareEnum failed",
+                    Subject{Subject::kShares, ""});
   std::vector<std::string> names;
   names.reserve(static_cast<size_t>(list->count));
   for (int i = 0; i < list->count; ++i) names.emplace_back(KLIBCSzListGet(list, i));

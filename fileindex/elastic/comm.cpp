@@ -58,7 +58,8 @@ void ThrowIfFailed(const Json::Value& res) {
   const Json::Value error = Member<Json::Value>(res, "error");
   GetJsonValue(code, error, "code", true);
   GetJsonValue(message, error, "msg", true);
-  throw Error(static_cast<Error::ErrorCode>(code), "Request failed, msg=" + message);
+  throw SubjectError(static_cast<Error::ErrorCode>(code), "Request failed, msg=" + message,
+                     {Subject::kEngineRefusal, message});
 }
 
 /// Whether each part's result is an object, as is its error, if any; null counts as an empty one.
@@ -99,7 +100,7 @@ bool TrySendRequest(Json::Value& res, const Json::Value& req) {
     SendRequestImpl(res, req);
     return true;
   } catch (const Error& error) {
-    if (!IsBusy(error.Code())) throw Error(error);
+    if (!IsBusy(error.Code())) throw;
     return false;
   }
 }
@@ -111,15 +112,16 @@ void SendRequestImpl(Json::Value& res, const Json::Value& req) {
   res = Json::Value();
   WaitForSocket(path);
   kovadaemon::DomainSockConnection conn(path);
-  FERROX_FAIL_IF(!conn.Connect(), Error::kEngineUnreachable, "Connect failed");
-  FERROX_FAIL_IF_AS(!conn.Send(toString(req)), "!conn.Send(req.toString())", Error::kEngineUnreachable, "Send failed");
+  FERROX_FAIL_IF(!conn.Connect(), Error::kEngineUnreachable, "Connect failed", Subject{Subject::kEngineConnect, ""});
+  FERROX_FAIL_IF_AS(!conn.Send(toString(req)), "!conn.Send(req.toString())", Error::kEngineUnreachable, "Send failed",
+                    Subject{Subject::kEngineSend, ""});
   FERROX_FAIL_IF_AS(!ReceiveReply(res, conn), kUnusableReply, Error::kEngineUnreachable,
-                    "Recv failed, res=" + toString(res));
+                    "Recv failed, res=" + toString(res), Subject{Subject::kEngineReply, ""});
   ThrowIfFailed(res);
   if (!req.isObject() || !req.isMember("compound") || !Member(res, "has_fail", false)) return;
   const Json::Value& results = std::as_const(res)["data"];
   FERROX_FAIL_IF_AS(!AreResults(results), kUnusableReply, Error::kEngineUnreachable,
-                    "Recv failed, res=" + toString(res));
+                    "Recv failed, res=" + toString(res), Subject{Subject::kEngineReply, ""});
   CheckParts(req["compound"], results);
 }
 

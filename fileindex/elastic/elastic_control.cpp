@@ -99,7 +99,8 @@ void IndexRename(const std::string& share, const std::string& new_path, const st
 void IndexGetByPrefixPath(const std::string& index_id, const std::string& prefix, std::vector<std::string>& paths) {
   for (const Json::Value& entry : ListBelow(index_id, prefix, {kKOVAMDPath})) {
     FERROX_FAIL_IF(!IsJsonObject(entry) || !isJsonType<std::string>(entry.get(kKOVAMDPath, "")),
-                   Error::kEngineUnreachable, "Recv failed, res=" + toString(entry));
+                   Error::kEngineUnreachable, "Recv failed, res=" + toString(entry),
+                   Subject{Subject::kEngineReply, ""});
     if (entry.isMember(kKOVAMDPath)) paths.push_back(entry[kKOVAMDPath].asString());
   }
 }
@@ -107,9 +108,9 @@ void IndexGetByPrefixPath(const std::string& index_id, const std::string& prefix
 void IndexCommit(const std::string& share_name) {
   try {
     SendRequest(IndexRequest("commit", GetFileIndexID(share_name)));
-  } catch (const Error& error) {
+  } catch (const Error&) {
     const sdk::SDKShare share(share_name);
-    if (share.IsSpaceEnough()) throw Error(error);
+    if (share.IsSpaceEnough()) throw;
     newClass<StatusMgr>()->SetShareStatus(share_name, StatusMgr::kNeedReindex);
     FERROX_FAIL_IF_AS(true, "!share.IsSpaceEnough()", Error::kSpaceNotEnough,
                       "Share (" + share_name + ") space not enough");

@@ -111,7 +111,7 @@ FolderMgr::FolderMgr() {
   Json::Value folders(Json::arrayValue);
   FERROX_FAIL_IF_AS(IsFileExist(path) && !ReadFolders(folders, path),
                     "IsFileExist(kFileIndexFoldersCfgPath) && !folders.fromFile(kFileIndexFoldersCfgPath)",
-                    Error::kLoadFailed, "Cannot load json: " + path);
+                    Error::kLoadFailed, "Cannot load json: " + path, Subject{Subject::kFile, path});
   folders_.reserve(folders.size());
   for (const Json::Value& folder : folders) folders_.push_back(newClass<Folder>(folder));
 }
@@ -123,9 +123,10 @@ void FolderMgr::Save() const {
   const sdk::SDKCredentials credentials("root");
   Json::Value folders(Json::arrayValue);
   for (const auto& folder : folders_) folders.append(folder->GetData());
-  FERROX_FAIL_IF_AS(!toFile(folders, path), "!folders.toFile(kFileIndexFoldersCfgPath)", Error::kSaveFailed, path);
+  FERROX_FAIL_IF_AS(!toFile(folders, path), "!folders.toFile(kFileIndexFoldersCfgPath)", Error::kSaveFailed, path,
+                    Subject{Subject::kFile, path});
   FERROX_FAIL_IF_AS(-1 == chmod(path.c_str(), 0644), "-1 == chmod(kFileIndexFoldersCfgPath, 0644)", Error::kInternal,
-                    path);
+                    path, Subject{Subject::kFile, path});
 }
 
 FolderLookup& FolderMgr::ByFullPath() const {

@@ -3,7 +3,7 @@
 #include "fileindex/folders/folder_status.h"
 
 #include <cassert>
-#include <optional>
+#include <exception>
 
 #include "base/path_table.h"
 #include "common/clock.h"
@@ -34,8 +34,8 @@ class QueueScan {
     };
     try {
       (void)QueueMgr(queue_path).FindQueues(touches_last);
-    } catch (const Error& error) {
-      failure_ = error;
+    } catch (const Error&) {
+      failure_ = std::current_exception();
     }
   }
 
@@ -44,7 +44,7 @@ class QueueScan {
     const size_t* mark = marks_.Find(full_path);
     assert(mark != nullptr);
     if (is_touched_[*mark]) return true;
-    if (failure_) throw Error(*failure_);
+    if (failure_) std::rethrow_exception(failure_);
     return false;
   }
 
@@ -60,7 +60,7 @@ class QueueScan {
   base::PathTable<size_t> marks_;
   std::vector<bool> is_touched_;
   size_t untouched_ = 0;
-  std::optional<Error> failure_;
+  std::exception_ptr failure_;
 };
 
 namespace {

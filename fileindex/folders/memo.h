@@ -1,7 +1,7 @@
 #pragma once
 
+#include <exception>
 #include <memory>
-#include <optional>
 #include <utility>
 
 #include "common/error.h"
@@ -15,11 +15,11 @@ class Memo {
   /// What is kept, else what `make` returns, a std::unique_ptr. @throws Error as `make` did.
   template <typename Make>
   T& Get(const Make& make) {
-    if (failure_) throw Error(*failure_);  // logged when it arose
+    if (failure_) std::rethrow_exception(failure_);  // logged when it arose
     try {
       if (value_ == nullptr) value_ = make();
-    } catch (const Error& error) {
-      failure_ = error;
+    } catch (const Error&) {
+      failure_ = std::current_exception();
       throw;
     }
     return *value_;
@@ -27,7 +27,7 @@ class Memo {
 
  private:
   std::unique_ptr<T> value_;
-  std::optional<Error> failure_;
+  std::exception_ptr failure_;
 };
 
 }  // namespace ferrox::fileindex

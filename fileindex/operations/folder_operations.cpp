@@ -48,7 +48,8 @@ std::string QueueingOf(const Changes& changes) {
 
 void AddNotifySteps(OperationSteps& steps, const std::set<std::string>& shares, bool is_upsert) {
   for (const std::string& share : shares) {
-    steps.Add("tell the index daemon of " + share, [&share, is_upsert] { NotifySettingChanged(share, is_upsert); });
+    steps.AddOfShare("tell the index daemon of", share,
+                     [&share, is_upsert] { NotifySettingChanged(share, is_upsert); });
   }
 }
 
@@ -63,7 +64,7 @@ void FolderUpsert(const Json::Value& folder_list, bool create, bool updater_mode
     const auto folder_new = newClass<Folder>(element);
     FERROX_FAIL_IF_AS(!updater_mode && !CanPathBeIndexed(folder_new->GetPath()),
                       "!CanPathBeIndexed(folder_new->GetPath()) && !updater_mode", Error::kPathNotIndexable,
-                      "Path cannot index: " + folder_new->GetPath());
+                      "Path cannot index: " + folder_new->GetPath(), Subject{Subject::kFolder, folder_new->GetPath()});
     FERROX_FAIL_IF(create && folder_mgr.HasFolder(folder_new->GetPath()), Error::kDuplicatedFolder,
                    "Duplicated ID: " + folder_new->GetPath());
     std::shared_ptr<Folder> diff;
@@ -76,31 +77,31 @@ void FolderUpsert(const Json::Value& folder_list, bool create, bool updater_mode
 
   // Nothing was changed so far.
   OperationSteps steps(create ? "FolderAdd" : "FolderSet");
-  steps.Add("start the services", [] { SetupRelatedServices(true); });
+  steps.Add("start the services", {Subject::kServices, ""}, [] { SetupRelatedServices(true); });
   for (const std::string& share : shares) {
     if (create && !before.IsShareIndexed(share)) {
-      steps.Add("create the index of " + share, [&share] { CreateShareIndex(share); });
+      steps.AddOfShare("create the index of", share, [&share] { CreateShareIndex(share); });
     }
     AddWatchStep(steps, share, folder_mgr);
   }
   AddSaveStep(steps, folder_mgr);
   AddNotifySteps(steps, shares, true);
-  if (!updater_mode) steps.Add(QueueingOf(changes), [&changes] { QueueChanges(changes); });
+  if (!updater_mode) steps.Add(QueueingOf(changes), {Subject::kFolders, ""}, [&changes] { QueueChanges(changes); });
   steps.Run();
 }
 
 /// Undoes what indexing a share has made, once no folder of it is left.
 void AddForgetSteps(OperationSteps& steps, const std::string& share) {
   const bool known = IsShareKnown(share);
-  steps.Add("delete the index of " + share, [&share] { DeleteShareIndex(share); });
+  steps.AddOfShare("delete the index of", share, [&share] { DeleteShareIndex(share); });
   if (!known) {
     Log(LOG_WARNING, "share [%s] is gone, and with it where its queue and its index were", share.c_str());
-    steps.Add("clear the status of " + share, [&share] { newClass<StatusMgr>()->ClearShareStatus(share); });
+    steps.AddOfShare("clear the status of", share, [&share] { newClass<StatusMgr>()->ClearShareStatus(share); });
     return;
   }
-  steps.Add("stop watching " + share, [&share] { DeleteKOVANotifydCfg(share); });
-  steps.Add("remove the index data of " + share,
-            [&share] { CleanShareIndexData(share, sdk::SDKShare(share).GetPath()); });
+  steps.AddOfShare("stop watching", share, [&share] { DeleteKOVANotifydCfg(share); });
+  steps.AddOfShare("remove the index data of", share,
+                   [&share] { CleanShareIndexData(share, sdk::SDKShare(share).GetPath()); });
 }
 
 void RebuildShare(const std::string& share_name) {
@@ -150,12 +151,12 @@ void FolderReindex(const Json::Value& path_list) {
 
   OperationSteps steps(__func__);
   for (const std::string& share : to_rebuild) {
-    steps.Add("rebuild the index of " + share, [&share] { RebuildShare(share); });
+    steps.AddOfShare("rebuild the index of", share, [&share] { RebuildShare(share); });
   }
   for (const std::string& share : shares) {
     // Deliberate: the second condition alone stays; it goes only together with the first.
     if ((status_mgr.GetShareStatus(share) & StatusMgr::kNeedReindex) == 0) continue;
-    steps.Add("clear the status of " + share, [&share] {
+    steps.AddOfShare("clear the status of", share, [&share] {
       newClass<StatusMgr>()->UnsetShareStatus(share, StatusMgr::kNeedReindex | StatusMgr::kSecondCondition);
     });
   }
@@ -191,7 +192,7 @@ void FolderDelete(const Json::Value& path_list) {
   }
   AddSaveStep(steps, folder_mgr);
   AddNotifySteps(steps, shares, false);
-  steps.Add(QueueingOf(to_compare), [&to_compare] { QueueChanges(to_compare); });
+  steps.Add(QueueingOf(to_compare), {Subject::kFolders, ""}, [&to_compare] { QueueChanges(to_compare); });
   AddStopStep(steps, folder_mgr);
   steps.Run();
 }

@@ -102,7 +102,7 @@ void UserRename(const std::string& user_from, const std::string& user_to) {
   }
   OperationSteps steps(__func__);
   AddSaveStep(steps, folder_mgr);
-  steps.Add("queue the rename of " + user_from,
+  steps.Add("queue the rename of " + user_from, {Subject::kUser, user_from},
             [&] { AddCustomEvent(EVENT_RENAME, GetFullPath(home_to), GetFullPath(home_from), Json::Value()); });
   steps.Run();
 }

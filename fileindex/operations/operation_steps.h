@@ -4,29 +4,34 @@
 #include <string>
 #include <vector>
 
+#include "fileindex/operations/operation_error.h"
+
 namespace ferrox::fileindex {
 
 class FolderMgr;
 
-/// The steps of a management operation, in the order in which they are carried out.
+/// The steps of a management operation, in the order in which they are carried out. An operation checks everything
+/// first, adds its steps, and runs them last, so that a failed check changes nothing.
 class OperationSteps {
  public:
-  /// `operation` is the name of the entry point, for the log.
+  /// `operation` is the name of the entry point, for the log; it must outlive the object.
   explicit OperationSteps(const char* operation) : operation_(operation) {}
 
-  /// `what` says in the infinitive what `run` does: "save the folders".
-  void Add(std::string what, std::function<void()> run) { steps_.push_back({std::move(what), std::move(run)}); }
+  /// `what` says in the infinitive what `run` does: "save the folders". `about` is what it changes.
+  void Add(std::string what, Subject about, std::function<void()> run);
+  /// The same for a step of one share: "<what> <share>".
+  void AddOfShare(const std::string& what, const std::string& share, std::function<void()> run);
 
-  /// Carries the steps out. What one throws goes on to the caller; those before it stay done, and the log says which
-  /// were not.
+  /// Carries the steps out. When one throws an Error, those before it stay done, those behind it are not begun, and the
+  /// log names what is not done. @throws OperationError with the step's code and reason; what is no Error as it comes.
   void Run() const;
 
  private:
   struct Step {
-    std::string what;
+    OperationStep step;
     std::function<void()> run;
   };
-  void LogNotDone(size_t first, const char* reason) const;
+  OperationError Stopped(size_t first, const Error& failure) const;
 
   const char* operation_;
   std::vector<Step> steps_;

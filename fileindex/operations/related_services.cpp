@@ -125,25 +125,28 @@ void UpsertKOVANotifydCfg(const std::string& share_name, const FolderMgr& folder
   const sdk::SDKShare share(share_name);
   const MonitorQueue monitor_queue(WatchListOf(share_name, share.GetQueuePath(), folder_mgr));
   FERROX_FAIL_IF(!MonitorQueue::Upsert(monitor_queue, kAppName, MONITOR_QUEUE_TYPE_APPLICATION), Error::kInternal,
-                 "MonitorQueue::Upsert failed, share=" + share_name);
+                 "MonitorQueue::Upsert failed, share=" + share_name, Subject{Subject::kWatching, share_name});
 }
 
 void DeleteKOVANotifydCfg(const std::string& share_name) {
   const sdk::SDKShare share(share_name);
   FERROX_FAIL_IF(!MonitorQueue::Delete(share.GetQueuePath(), kAppName, MONITOR_QUEUE_TYPE_APPLICATION),
-                 Error::kInternal, "MonitorQueue::Delete failed, share=" + share_name);
+                 Error::kInternal, "MonitorQueue::Delete failed, share=" + share_name,
+                 Subject{Subject::kWatchingEnd, share_name});
 }
 
 void CleanShareIndexData(const std::string& share, const std::string& share_path) {
   const std::string queue_path = ComposeQueuePath(share_path);
   FERROX_FAIL_IF_AS(!IsRemovable(queue_path),
                     "0 > FILEIDXQueuePathCompose(share_path.c_str(), queue_path, sizeof(queue_path))", Error::kInternal,
-                    "FILEIDXQueuePathCompose failed, share_path=" + share_path);
+                    "FILEIDXQueuePathCompose failed, share_path=" + share_path,
+                    Subject{Subject::kQueuePlace, share_path});
   Remove(queue_path);
   Remove(DetachedQueuePath(queue_path));
   const std::string db_path = ComposeDBPath(share_path);
   FERROX_FAIL_IF_AS(!IsRemovable(db_path), "0 > FILEIDXDBPathCompose(share_path.c_str(), db_path, sizeof(db_path))",
-                    Error::kInternal, "FILEIDXDBPathCompose failed, share_path=" + share_path);
+                    Error::kInternal, "FILEIDXDBPathCompose failed, share_path=" + share_path,
+                    Subject{Subject::kIndexPlace, share_path});
   Remove(db_path);
   newClass<StatusMgr>()->ClearShareStatus(share);
 }

@@ -43,9 +43,9 @@ bool LiesOnVolume(const Folder& folder, const std::string& mount_point) {
 }
 
 void AddPauseSteps(OperationSteps& steps, const std::string& share) {
-  steps.Add("stop the worker of " + share, [&share] { DeleteWorker(share); });
-  steps.Add("stop watching " + share, [&share] { DeleteKOVANotifydCfg(share); });
-  steps.Add("pause the index of " + share, [&share] { elastic::ShareIndexPause(share); });
+  steps.AddOfShare("stop the worker of", share, [&share] { DeleteWorker(share); });
+  steps.AddOfShare("stop watching", share, [&share] { DeleteKOVANotifydCfg(share); });
+  steps.AddOfShare("pause the index of", share, [&share] { elastic::ShareIndexPause(share); });
 }
 
 /// The share's folder as it was called before the rename: the last component of its path is its name.
@@ -64,9 +64,9 @@ void ShareRename(const std::string& share_from, const std::string& share_to) {
   }
   OperationSteps steps(__func__);
   AddSaveStep(steps, folder_mgr);
-  steps.Add("rename the index of " + share_from,
-            [&] { elastic::ShareIndexRename(share_from, share_to, sdk::SDKShare(share_to).GetDBPath()); });
-  steps.Add("queue the rename of " + share_from, [&] {
+  steps.AddOfShare("rename the index of", share_from,
+                   [&] { elastic::ShareIndexRename(share_from, share_to, sdk::SDKShare(share_to).GetDBPath()); });
+  steps.AddOfShare("queue the rename of", share_from, [&] {
     const std::string path = sdk::SDKShare(share_to).GetPath();
     AddCustomEvent(EVENT_RENAME, path, PathBeforeRename(path, share_to, share_from), Json::Value());
   });
@@ -79,10 +79,10 @@ void ShareMigrate(const std::string& share_name, const std::string& path_from, c
   FERROX_FAIL_IF(path_to.empty(), Error::kBadArgument, "Missing path_to");
   if (!FolderMgr().IsShareIndexed(share_name)) return;
   OperationSteps steps(__func__);
-  steps.Add("move the index of " + share_name,
-            [&] { elastic::ShareIndexMigrate(share_name, sdk::SDKShare(share_name).GetDBPath()); });
-  steps.Add("queue the move of " + share_name,
-            [&] { AddCustomEvent(EVENT_RENAME, path_to, path_from, Json::Value()); });
+  steps.AddOfShare("move the index of", share_name,
+                   [&] { elastic::ShareIndexMigrate(share_name, sdk::SDKShare(share_name).GetDBPath()); });
+  steps.AddOfShare("queue the move of", share_name,
+                   [&] { AddCustomEvent(EVENT_RENAME, path_to, path_from, Json::Value()); });
   steps.Run();
 }
 
@@ -102,9 +102,9 @@ void ShareResume(const std::string& share_name) {
   const FolderMgr folder_mgr;
   if (!folder_mgr.IsShareIndexed(share_name)) return;
   OperationSteps steps(__func__);
-  steps.Add("resume the index of " + share_name, [&] { elastic::ShareIndexResume(share_name); });
+  steps.AddOfShare("resume the index of", share_name, [&] { elastic::ShareIndexResume(share_name); });
   AddWatchStep(steps, share_name, folder_mgr);
-  steps.Add("start the worker of " + share_name, [&] { CreateWorker(share_name); });
+  steps.AddOfShare("start the worker of", share_name, [&] { CreateWorker(share_name); });
   SetPausedOfShare(folder_mgr, share_name, false);
   AddSaveStep(steps, folder_mgr);
   steps.Run();
@@ -115,8 +115,8 @@ void ShareClearPaused(const std::string& share_name, const std::string& share_pa
   FERROX_FAIL_IF(share_path.empty(), Error::kBadArgument, "Missing share path");
   FolderMgr folder_mgr;
   OperationSteps steps(__func__);
-  steps.Add("remove the index data of " + share_name, [&] { CleanShareIndexData(share_name, share_path); });
-  steps.Add("delete the index of " + share_name, [&] { DeleteShareIndex(share_name); });
+  steps.AddOfShare("remove the index data of", share_name, [&] { CleanShareIndexData(share_name, share_path); });
+  steps.AddOfShare("delete the index of", share_name, [&] { DeleteShareIndex(share_name); });
   folder_mgr.DeleteByShare(share_name);
   AddSaveStep(steps, folder_mgr);
   AddStopStep(steps, folder_mgr);
@@ -158,8 +158,8 @@ void VolumeResume(const std::string& mount_point) {
   OperationSteps steps(__func__);
   AddSaveStep(steps, folder_mgr);
   for (const std::string& share : shares) {
-    steps.Add("resume the index of " + share, [&share] { elastic::ShareIndexResume(share); });
-    steps.Add("start the worker of " + share, [&share] { CreateWorker(share); });
+    steps.AddOfShare("resume the index of", share, [&share] { elastic::ShareIndexResume(share); });
+    steps.AddOfShare("start the worker of", share, [&share] { CreateWorker(share); });
     AddWatchStep(steps, share, folder_mgr);
   }
   steps.Run();
@@ -176,7 +176,7 @@ void VolumeClearPaused(const std::string& mount_point) {
   OperationSteps steps(__func__);
   for (const std::string& share : shares) {
     folder_mgr.DeleteByShare(share);
-    steps.Add("clear the status of " + share, [&] { status_mgr->ClearShareStatus(share); });
+    steps.AddOfShare("clear the status of", share, [&] { status_mgr->ClearShareStatus(share); });
   }
   AddSaveStep(steps, folder_mgr);
   AddStopStep(steps, folder_mgr);

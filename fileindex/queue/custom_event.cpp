@@ -6,8 +6,8 @@
 #include <unistd.h>
 
 #include <cerrno>
+#include <exception>
 #include <functional>
-#include <optional>
 
 #include <json/value.h>
 
@@ -52,7 +52,7 @@ void QueueOrMark(const std::string& path, const std::string& line, const IsCover
         static_cast<int>(error.Code()), error.what(), share_name.c_str(), ErrnoSuffix().c_str());
     errno = 0;
     newClass<StatusMgr>()->SetShareStatus(share_name, StatusMgr::kNeedReindex);
-    throw Error(error);
+    throw;
   }
 }
 
@@ -67,8 +67,8 @@ class QueuedReindexes {
         if (event->event == EVENT_REINDEX) Add(event->path);
         return false;
       });
-    } catch (const Error& error) {
-      failure_ = error;
+    } catch (const Error&) {
+      failure_ = std::current_exception();
     }
   }
 
@@ -77,13 +77,13 @@ class QueuedReindexes {
   /// QueueMgr::IsFullPathHasReindex: what stands before a bad line is found, then the bad line fails.
   bool Cover(const std::string& full_path) const {
     const bool is_covered = paths_.HasAtOrAbove(full_path);
-    if (!is_covered && failure_) throw Error(*failure_);
+    if (!is_covered && failure_) std::rethrow_exception(failure_);
     return is_covered;
   }
 
  private:
   base::PathTable<bool> paths_;
-  std::optional<Error> failure_;
+  std::exception_ptr failure_;
 };
 
 void AddCustomEvent(int event, const std::string& path, const std::string& path_old, const Json::Value& data) {

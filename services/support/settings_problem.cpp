@@ -8,6 +8,7 @@
 #include "common/json_util.h"
 #include "common/log.h"
 #include "common/paths.h"
+#include "common/subject_error.h"
 
 namespace ferrox::services {
 
@@ -58,10 +59,11 @@ std::string FoldersFileProblem() {
 
 std::string Describe(const Error& error) {
   const std::string reason = error.what();
-  const size_t data = reason.find(", data=");  // the whole JSON text
+  const Subject subject = SubjectError::Of(error);
+  const bool is_json = subject.kind == Subject::kJson;
   const bool is_of_shares = error.Code() == Error::kNoSuchShare || error.Code() == Error::kShareEnumFailed;
-  std::string text = reason.substr(0, data);
-  if (error.Code() == Error::kLoadFailed || (error.Code() == Error::kBadArgument && data != std::string::npos)) {
+  std::string text = is_json ? subject.name : reason;
+  if (error.Code() == Error::kLoadFailed || is_json) {
     const std::string problem = FoldersFileProblem();
     if (!problem.empty()) {
       text = problem;

@@ -12,6 +12,7 @@ import sys
 
 EXPECTED = ["ferrox::Error::what() const", "ferrox::LockFile::~LockFile()", "ferrox::sdk::SDKMutex()",
             "ferrox::SendCommandToDaemon(", "ferrox::fileindex::AddCustomEvent(", "typeinfo for ferrox::Error",
+            "typeinfo for ferrox::SubjectError", "typeinfo for ferrox::fileindex::OperationError",
             "ferrox::fileindex::StatusMgr::Pause(int)", "ferrox::fileindex::elastic::SendRequestImpl(",
             "ferrox::fileindex::OPTree::ProcessOP(", "ferrox::fileindex::QueueMgr::PrepareTmpQueue()",
             "ferrox::fileindex::FolderMgr::Upsert(", "ferrox::fileindex::FolderMgr::GetMostSuitableCfg(",

@@ -3,6 +3,7 @@
 #include <csignal>
 
 #include "common/lock_file.h"
+#include "fileindex/operations/operation_error.h"
 #include "tests/library/index_mgr_fixture.h"
 
 namespace ferrox::fileindex {
@@ -99,21 +100,35 @@ TEST_F(IndexMgrTest, ServicesThatFailStopNothing) {
 }
 
 TEST_F(IndexMgrTest, WhatWasNotDoneIsSaid) {
-  const auto check = [this](const std::string& failure, const std::string& stored, const std::string& not_done) {
-    EXPECT_EQ(Failure([] { FolderAdd(Folders("/photo"), false); }), failure);
+  const auto check = [this](const std::string& failure, const std::string& stored, const std::string& not_done,
+                            Subject::Kind cause, Subject::Kind step) {
+    EXPECT_EQ(Failure([&] {
+                try {
+                  FolderAdd(Folders("/photo"), false);
+                } catch (const OperationError& error) {
+                  EXPECT_EQ(error.NotDoneText().substr(0, not_done.size()), not_done);
+                  EXPECT_EQ(error.About().kind, cause) << failure;
+                  EXPECT_EQ(error.NotDone().front().about.kind, step) << failure;
+                  throw;
+                }
+              }),
+              failure);
     EXPECT_EQ(Stored(), stored);
     EXPECT_TRUE(log_.Contains(failure.substr(failure.find(' ') + 1) + ". Not done: " + not_done)) << failure;
     SetUp();
   };
   engine_fails_["index_create"] = 1407;
-  check("1407 Request failed, msg=m", "", "create the index of photo; watch the folders of photo; save the folders");
+  check("1407 Request failed, msg=m", "", "create the index of photo; watch the folders of photo; save the folders",
+        Subject::kEngineRefusal, Subject::kShare);
   platform_.failing["MonitorQueue::Upsert"] = {};
-  check("502 MonitorQueue::Upsert failed, share=photo", "", "watch the folders of photo; save the folders; tell the");
+  check("502 MonitorQueue::Upsert failed, share=photo", "", "watch the folders of photo; save the folders; tell the",
+        Subject::kWatching, Subject::kShare);
   fs::create_directories(folders_ + ".new");
-  check("505 " + folders_, "", "save the folders; tell the index daemon of photo; queue the changes of 1 folders");
+  check("505 " + folders_, "", "save the folders; tell the index daemon of photo; queue the changes of 1 folders",
+        Subject::kFile, Subject::kFolders);
   daemon_runs_ = false;
   check("502 write failed, reason=Transport endpoint is not connected", "/photo dp; ",
-        "tell the index daemon of photo; queue the changes of 1 folders");
+        "tell the index daemon of photo; queue the changes of 1 folders", Subject::kDaemonChannel, Subject::kShare);
 }
 
 TEST_F(IndexMgrTest, DeleteFollowsWhatIsLeft) {
