@@ -1,11 +1,11 @@
 #include "services/kovanotifyd/notifier.h"
 
 #include <poll.h>
-#include <sys/eventfd.h>
 #include <syslog.h>
-#include <unistd.h>
 
 #include <algorithm>
+#include <future>
+#include <memory>
 #include <utility>
 
 #include "common/log.h"
@@ -17,13 +17,16 @@ namespace {
 using SteadyClock = std::chrono::steady_clock;
 using TimePoint = SteadyClock::time_point;
 
-/// The registry and the folders are looked at so often, whether or not something was seen to change.
+/// After which the registry and the roots' folders are examined although nothing was reported; the shorter one while a
+/// root waits for its folder.
 constexpr std::chrono::seconds kExamineInterval{30};
 constexpr std::chrono::seconds kExamineIntervalWaiting{3};
+/// What one turn of the loop may spend on WatchSet::Advance.
 constexpr std::chrono::milliseconds kSlice{20};
-/// So many changes at once are a sign that the kernel's queue fills while nobody reads it.
+/// So many changes in one read are a sign that the kernel's queue is filling: the next read does not wait for a batch.
 constexpr uint64_t kBusyChanges = 1000;
-constexpr std::chrono::seconds kStatusTimeout{10};
+/// For the loop's answer, beside the time that a sync may take.
+constexpr std::chrono::seconds kAnswerTimeout{10};
 constexpr char kStopping[] = "the notification daemon is being stopped; start it with 'fileindexctl up'";
 
 int MillisecondsUntil(TimePoint due) {
@@ -32,7 +35,7 @@ int MillisecondsUntil(TimePoint due) {
   return static_cast<int>(std::clamp<int64_t>(left, 0, 3600 * 1000));
 }
 
-/// What the loop promised to another thread; a promise that the loop dropped is its end.
+/// Waits for what the loop promised to another thread. A broken promise means that the loop has ended.
 template <typename Result>
 Result Await(std::future<Result> future, std::chrono::milliseconds at_most, const char* late) {
   if (future.wait_for(at_most) != std::future_status::ready) throw Error(Error::kInternal, late);
@@ -43,20 +46,20 @@ Result Await(std::future<Result> future, std::chrono::milliseconds at_most, cons
   }
 }
 
+bool StartsWithAny(const std::string& path, const std::vector<std::string>& beginnings) {
+  return std::any_of(beginnings.begin(), beginnings.end(),
+                     [&path](const std::string& beginning) { return path.starts_with(beginning); });
+}
+
 }  // namespace
 
 Notifier::Notifier(Options options)
     : options_(std::move(options)),
-      registry_watch_(options_.registry_folder),
+      registry_(options_.registry_folder, options_.read_registry),
       router_(options_.router),
       watches_(std::move(options_.ways), options_.scans, *this),
-      syncs_(watches_.Ways()),
-      read_at_(TimePoint::max()),
-      flush_at_(TimePoint::max()),
-      scan_at_(SteadyClock::now() + options_.scan_interval),
-      expire_at_(TimePoint::max()),
-      wake_(eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK)) {
-  FERROX_FAIL_IF(!wake_.Valid(), Error::kInternal, "eventfd: " + ErrnoText());
+      syncs_(std::move(options_.cookies)) {
+  due_.scan = SteadyClock::now() + options_.scan_interval;
 }
 
 Notifier::~Notifier() { Close(); }
@@ -70,36 +73,36 @@ void Notifier::Run(int stop_fd) {
   if (!problem.empty()) Log(LOG_WARNING, "stopping: %s", problem.c_str());
 }
 
-/// One turn: waits for something to do, and does it.
+/// One turn of the loop: waits for something to do, and does it.
 void Notifier::Step(int stop_fd) {
   Wait(stop_fd);
-  RunTasks();
-  DoWhatIsDue();
+  tasks_.RunAll();
+  RunDue();
   if (syncs_.IsWanted()) BeginSync();
-  if (SteadyClock::now() >= read_at_ || syncs_.IsRunning()) ReadChanges();
+  if (SteadyClock::now() >= due_.read || syncs_.IsRunning()) ReadChanges();
   if (has_work_) has_work_ = watches_.Advance(kSlice);
   if (disturbed_ || watches_.IsDisturbed()) {
     watches_.Examine();
-    AfterExamination();
+    ScheduleExamination();
   }
-  flush_at_ = router_.Flush(SteadyClock::now());
+  due_.flush = router_.Flush(SteadyClock::now());
   if (syncs_.IsRunning()) ContinueSync();
 }
 
 Notifier::TimePoint Notifier::NextDue() const {
   if (has_work_ || registry_changed_ || syncs_.IsWanted()) return SteadyClock::now();
-  TimePoint due = std::min({read_at_, flush_at_, examine_at_, expire_at_});
-  if (watches_.HasScans()) due = std::min(due, scan_at_);
+  TimePoint due = std::min({due_.read, due_.flush, due_.examine, due_.expire});
+  if (watches_.Roots().HasScanned()) due = std::min(due, due_.scan);
   return due;
 }
 
 void Notifier::Wait(int stop_fd) {
-  std::vector<pollfd> polled = {{stop_fd, POLLIN, 0}, {wake_.Get(), POLLIN, 0}, {registry_watch_.Fd(), POLLIN, 0}};
+  std::vector<pollfd> polled = {{stop_fd, POLLIN, 0}, {tasks_.Fd(), POLLIN, 0}, {registry_.Fd(), POLLIN, 0}};
   const size_t disturbances = polled.size();
   for (const pollfd& disturbance : watches_.Disturbances()) polled.push_back(disturbance);
   const size_t changes = polled.size();
-  // While a batch gathers, or is known to be there, its descriptors would only end the wait.
-  const bool is_gathering = read_at_ != TimePoint::max() && !syncs_.IsRunning();
+  // While a batch gathers, the watchers' descriptors are readable all the time and would end the wait at once.
+  const bool is_gathering = due_.read != TimePoint::max() && !syncs_.IsRunning();
   for (size_t way = 0; !is_gathering && way < watches_.Ways(); ++way) polled.push_back({watches_.FdOf(way), POLLIN, 0});
   if (poll(polled.data(), polled.size(), MillisecondsUntil(NextDue())) <= 0) return;
   const auto is_ready = [&polled](size_t i) { return polled[i].revents != 0; };
@@ -107,105 +110,50 @@ void Notifier::Wait(int stop_fd) {
   registry_changed_ = registry_changed_ || is_ready(2);
   for (size_t i = disturbances; i < changes; ++i) disturbed_ = disturbed_ || is_ready(i);
   for (size_t i = changes; i < polled.size(); ++i) {
-    if (is_ready(i)) read_at_ = std::min(read_at_, SteadyClock::now() + options_.batch);
+    if (is_ready(i)) due_.read = std::min(due_.read, SteadyClock::now() + options_.batch);
   }
 }
 
-void Notifier::RunTasks() {
-  uint64_t count = 0;
-  if (read(wake_.Get(), &count, sizeof(count)) != sizeof(count)) return;
-  std::vector<Task> tasks;
-  {
-    const std::lock_guard guard(mutex_);
-    tasks.swap(tasks_);
-  }
-  for (const Task& task : tasks) task();
-}
-
-void Notifier::DoWhatIsDue() {
+void Notifier::RunDue() {
   const TimePoint now = SteadyClock::now();
-  if (registry_changed_ || now >= examine_at_) ReadRegistry();
-  if (now >= scan_at_) {
+  if (registry_changed_ || now >= due_.examine) ReadRegistry();
+  if (now >= due_.scan) {
     watches_.Scan();
-    scan_at_ = now + options_.scan_interval;
+    due_.scan = now + options_.scan_interval;
   }
-  expire_at_ = syncs_.Expire(now, SyncState());
+  due_.expire = syncs_.Expire(now, SyncState());
 }
 
 void Notifier::ReadRegistry() {
   registry_changed_ = false;
-  registry_watch_.Rearm();
-  registry_ = options_.read_registry();
-  const std::set<std::string> problems(registry_.problems.begin(), registry_.problems.end());
-  for (const std::string& problem : problems) {
-    if (logged_problems_.count(problem) == 0) Log(LOG_ERR, "%s", problem.c_str());
-  }
-  logged_problems_ = problems;
-  router_.SetQueues(registry_.Queues());
-  watches_.Follow(registry_.list);
-  AfterExamination();
+  registry_.Read();
+  router_.SetQueues(registry_.Current().Queues());
+  watches_.Follow(registry_.Current().list);
+  ScheduleExamination();
 }
 
-void Notifier::AfterExamination() {
+/// After an examination, which may have given the watchers work: says when the next one is due.
+void Notifier::ScheduleExamination() {
   disturbed_ = false;
   has_work_ = true;
-  examine_at_ = SteadyClock::now() + (watches_.IsWaiting() ? kExamineIntervalWaiting : kExamineInterval);
+  const bool is_waiting = watches_.Roots().HasMissing();
+  due_.examine = SteadyClock::now() + (is_waiting ? kExamineIntervalWaiting : kExamineInterval);
 }
 
 void Notifier::ReadChanges() {
   const uint64_t before = changes_;
   for (size_t way = 0; way < watches_.Ways(); ++way) {
-    if (watches_.Read(way)) syncs_.Drained(way);
+    if (watches_.Read(way)) syncs_.OnAllRead(way);
   }
   has_work_ = true;
   const bool is_busy = changes_ - before >= kBusyChanges;
-  read_at_ = is_busy ? SteadyClock::now() : TimePoint::max();
-}
-
-void Notifier::BeginSync() {
-  ReadRegistry();
-  sync_problems_.clear();
-  watches_.Scan();
-  syncs_.Begin();
-  for (size_t way = 0; way < watches_.Ways(); ++way) {
-    // A watcher that is still being set up may miss its cookie, or come to refuse what it is used for; but what it
-    // covers is compared then, which says all.
-    if (!watches_.IsCovering(way)) continue;
-    if (options_.cookies[way].Touch()) {
-      syncs_.Touched(way);
-    } else {
-      sync_problems_.push_back("changes may be on their way: " + options_.cookies[way].Path() +
-                               " cannot be changed: " + ErrnoText());
-    }
-  }
-}
-
-void Notifier::ContinueSync() {
-  if (watches_.IsSettingUp()) return;
-  for (const size_t way : syncs_.Outstanding()) {
-    if (!watches_.IsCovering(way)) syncs_.Reported(way);  // it watches nothing any more
-  }
-  if (!syncs_.Outstanding().empty()) return;
-  const std::string held = router_.FlushAll(SteadyClock::now());
-  if (!held.empty()) sync_problems_.push_back(held);
-  for (const auto& problems : {registry_.problems, watches_.Problems()}) {
-    sync_problems_.insert(sync_problems_.end(), problems.begin(), problems.end());
-  }
-  syncs_.End(sync_problems_);
-}
-
-/// What a sync waits for.
-std::string Notifier::SyncState() const {
-  std::string state;
-  for (const size_t way : syncs_.Outstanding()) state += (state.empty() ? "" : ", ") + watches_.NameOf(way);
-  if (!state.empty()) return "changes are still being read (" + state + ")";
-  if (watches_.IsSettingUp()) return "folders are still being set up to be watched";
-  return "the notification daemon is busy";
+  due_.read = is_busy ? SteadyClock::now() : TimePoint::max();
 }
 
 void Notifier::OnChange(Change change) {
   ++changes_;
-  if (IsOwn(change.path) && (change.old_path.empty() || IsOwn(change.old_path))) return;
+  const std::vector<std::string>& own = options_.own_paths;
+  if (StartsWithAny(change.path, own) && (change.old_path.empty() || StartsWithAny(change.old_path, own))) return;
   router_.Put(change, SteadyClock::now());
 }
 
@@ -215,28 +163,43 @@ void Notifier::OnLost(size_t way) {
   ++lost_;
   Log(LOG_WARNING, "the kernel dropped changes (%s); what it was to report is compared with the disk",
       watches_.NameOf(way).c_str());
-  syncs_.Lost(way);
+  syncs_.OnLost(way);
 }
 
-void Notifier::OnCookie(size_t way) { syncs_.Reported(way); }
+void Notifier::OnCookie(size_t way) { syncs_.OnCookie(way); }
 
-bool Notifier::IsOwn(const std::string& path) const {
-  return std::any_of(options_.own_paths.begin(), options_.own_paths.end(),
-                     [&path](const std::string& own) { return path.compare(0, own.size(), own) == 0; });
+void Notifier::BeginSync() {
+  ReadRegistry();
+  watches_.Scan();
+  syncs_.Begin(watches_.Roots());
+}
+
+void Notifier::ContinueSync() {
+  if (!syncs_.IsDone(watches_.Roots())) return;
+  SyncRounds::Problems problems;
+  const std::string held = router_.FlushAll(SteadyClock::now());
+  if (!held.empty()) problems.push_back(held);
+  for (const auto& others : {registry_.Current().problems, watches_.Roots().Problems()}) {
+    problems.insert(problems.end(), others.begin(), others.end());
+  }
+  syncs_.End(problems);
+}
+
+/// What a sync waits for, in a sentence.
+std::string Notifier::SyncState() const {
+  std::string state;
+  for (const size_t way : syncs_.Outstanding()) state += (state.empty() ? "" : ", ") + watches_.NameOf(way);
+  if (!state.empty()) return "changes are still being read (" + state + ")";
+  if (watches_.Roots().IsSettingUp()) return "folders are still being set up to be watched";
+  return "the notification daemon is busy";
 }
 
 NotifierStatus Notifier::MakeStatus() const {
   NotifierStatus status;
-  const std::map<std::string, QueueFigures> figures = router_.Figures();
-  for (const Registration& registration : registry_.list) {
-    QueueStatus queue = {registration.queue, registration.application, {}, {}};
-    for (const QueueWatch& watch : registration.watches) queue.watches.push_back({watch.path, watches_.StateOf(watch)});
-    if (const auto found = figures.find(registration.queue); found != figures.end()) queue.figures = found->second;
-    status.queues.push_back(std::move(queue));
-  }
+  status.queues = QueueStatusOf(registry_.Current(), watches_, router_);
   status.changes = changes_;
   status.lost = lost_;
-  for (const auto& problems : {options_.problems, registry_.problems, watches_.Problems()}) {
+  for (const auto& problems : {options_.problems, registry_.Current().problems, watches_.Roots().Problems()}) {
     status.problems.insert(status.problems.end(), problems.begin(), problems.end());
   }
   return status;
@@ -248,10 +211,10 @@ std::vector<std::string> Notifier::Sync(std::chrono::milliseconds timeout) {
   const TimePoint deadline = SteadyClock::now() + timeout;
   Post([this, promise, deadline] {
     syncs_.Add(std::move(*promise), deadline);
-    expire_at_ = std::min(expire_at_, deadline);
+    due_.expire = std::min(due_.expire, deadline);
   });
   promise.reset();
-  SyncRounds::Outcome outcome = Await(std::move(future), timeout + kStatusTimeout, "the notification daemon is busy");
+  SyncRounds::Outcome outcome = Await(std::move(future), timeout + kAnswerTimeout, "the notification daemon is busy");
   if (!outcome.failure.empty()) throw Error(Error::kInternal, outcome.failure);
   return std::move(outcome.problems);
 }
@@ -261,26 +224,17 @@ NotifierStatus Notifier::Status() {
   std::future<NotifierStatus> future = promise->get_future();
   Post([this, promise] { promise->set_value(MakeStatus()); });
   promise.reset();
-  return Await(std::move(future), kStatusTimeout, "the notification daemon is busy");
+  return Await(std::move(future), kAnswerTimeout, "the notification daemon is busy");
 }
 
-void Notifier::Post(Task task) {
-  {
-    const std::lock_guard guard(mutex_);
-    if (is_closed_) throw Error(Error::kInternal, kStopping);
-    tasks_.push_back(std::move(task));
-  }
-  const uint64_t one = 1;
-  (void)!write(wake_.Get(), &one, sizeof(one));
+void Notifier::Post(TaskQueue::Task task) {
+  if (!tasks_.Post(std::move(task))) throw Error(Error::kInternal, kStopping);
 }
 
-/// Drops what was asked for: whoever waits is told.
+/// Requests that wait fail by a broken promise (Await), later ones by Post.
 void Notifier::Close() {
-  std::vector<Task> tasks;
-  const std::lock_guard guard(mutex_);
-  is_closed_ = true;
-  tasks.swap(tasks_);
-  syncs_ = SyncRounds(watches_.Ways());
+  tasks_.Close();
+  syncs_.DropRequests();
 }
 
 }  // namespace ferrox::notifyd

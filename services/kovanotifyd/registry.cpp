@@ -36,4 +36,14 @@ void RegistryWatch::Rearm() {
   (void)inotify_add_watch(inotify_.Get(), folder_.c_str(), kChanges);
 }
 
+void RegistryReader::Read() {
+  watch_.Rearm();
+  current_ = read_();
+  const std::set<std::string> problems(current_.problems.begin(), current_.problems.end());
+  for (const std::string& problem : problems) {
+    if (logged_problems_.count(problem) == 0) Log(LOG_ERR, "%s", problem.c_str());
+  }
+  logged_problems_ = problems;
+}
+
 }  // namespace ferrox::notifyd

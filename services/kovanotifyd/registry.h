@@ -2,6 +2,7 @@
 
 #include <functional>
 #include <map>
+#include <set>
 #include <string>
 #include <vector>
 
@@ -13,36 +14,54 @@ namespace ferrox::notifyd {
 /// What one application wants to have written into one queue.
 struct Registration {
   std::string application;
-  std::string queue;
+  std::string queue;  ///< the full path of the queue's file
   std::vector<QueueWatch> watches = {};
 };
 
-/// All that is registered, and a sentence for each entry that cannot be used.
+/// All registrations, and a sentence for each entry that cannot be used.
 struct Registry {
   std::vector<Registration> list = {};
   std::vector<std::string> problems = {};
 
-  /// By queue: several applications may share one.
+  /// The watches of each queue, by its path: several applications may share a queue.
   std::map<std::string, std::vector<QueueWatch>> Queues() const;
 };
 
 using ReadRegistry = std::function<Registry()>;
 
-/// Tells when a file of the registry's folder was replaced or removed.
+/// Notices changes of the registry's folder (docs/formats/notifyd.md): its files are replaced and removed, not changed.
 class RegistryWatch {
  public:
   /// Makes the folder when it is missing.
   explicit RegistryWatch(std::string folder);
 
-  /// Readable after a change; -1 where changes cannot be seen.
+  /// Readable after a change; -1 where changes cannot be noticed.
   int Fd() const { return inotify_.Get(); }
-  /// Takes note of the changes so far. To be called before the registry is read, also without a change: the folder
-  /// itself may have been replaced.
+  /// Drops what Fd has to report, and watches the folder that is at the path now, which may be a new one. To be called
+  /// before each reading of the registry.
   void Rearm();
 
  private:
   std::string folder_;
   base::UniqueFd inotify_;
+};
+
+/// The registry as it was last read.
+class RegistryReader {
+ public:
+  RegistryReader(std::string folder, ReadRegistry read) : watch_(std::move(folder)), read_(std::move(read)) {}
+
+  /// Readable when the registry should be read again; -1 where that cannot be noticed.
+  int Fd() const { return watch_.Fd(); }
+  /// Reads the registry, and logs the problems that it did not have at the last reading.
+  void Read();
+  const Registry& Current() const { return current_; }
+
+ private:
+  RegistryWatch watch_;
+  ReadRegistry read_;
+  Registry current_;
+  std::set<std::string> logged_problems_;
 };
 
 }  // namespace ferrox::notifyd

@@ -8,10 +8,11 @@
 #include <deque>
 #include <functional>
 #include <map>
-#include <mutex>
 #include <string>
 #include <vector>
 
+#include "base/mutex.h"
+#include "base/thread_annotations.h"
 #include "base/unique_fd.h"
 #include "services/kovanotifyd/cookie.h"
 #include "services/kovanotifyd/watcher.h"
@@ -32,29 +33,29 @@ class FakeWatcher : public Watcher {
 
   /// Reported by the next Read.
   void Say(Action action) {
-    const std::lock_guard guard(mutex_);
+    const base::MutexLock lock(mutex_);
     said_.push_back(std::move(action));
     (void)eventfd_write(wake_.Get(), 1);
   }
   void Say(const Change& change) {
     Say([change](WatchListener& listener) { listener.OnChange(change); });
   }
-  void Refuse(const std::string& reason) { Set(refusal_, reason); }
+  void Refuse(const std::string& reason) { Set(&FakeWatcher::refusal_, reason); }
   /// Roots below this path are not covered; "" for none.
-  void Hold(const std::string& path) { Set(held_path_, path); }
-  void HoldCookies(bool hold) { Set(holds_cookies_, hold); }
-  int Touches() const { return Get(touches_); }
+  void Hold(const std::string& path) { Set(&FakeWatcher::held_path_, path); }
+  void HoldCookies(bool hold) { Set(&FakeWatcher::holds_cookies_, hold); }
+  int Touches() const { return Get(&FakeWatcher::touches_); }
   /// "+path" and "-path" for each root added and removed.
-  std::string Calls() const { return Get(calls_); }
+  std::string Calls() const { return Get(&FakeWatcher::calls_); }
 
   const char* Name() const override { return "fake"; }
   void Add(const WatchRoot& root) override {
-    const std::lock_guard guard(mutex_);
+    const base::MutexLock lock(mutex_);
     calls_ += "+" + root.path + " ";
     fresh_[root.path] = true;
   }
   void Remove(const std::string& root) override {
-    const std::lock_guard guard(mutex_);
+    const base::MutexLock lock(mutex_);
     calls_ += "-" + root + " ";
     fresh_.erase(root);
   }
@@ -65,9 +66,9 @@ class FakeWatcher : public Watcher {
   }
   bool Advance(std::chrono::milliseconds, WatchListener& listener) override {
     std::vector<std::string> due;
-    const std::string refusal = Get(refusal_);
+    const std::string refusal = Get(&FakeWatcher::refusal_);
     {
-      const std::lock_guard guard(mutex_);
+      const base::MutexLock lock(mutex_);
       for (const auto& [path, is_fresh] : fresh_) {
         if (held_path_.empty() || path.compare(0, held_path_.size(), held_path_) != 0) due.push_back(path);
       }
@@ -82,19 +83,19 @@ class FakeWatcher : public Watcher {
 
  private:
   template <typename Value>
-  void Set(Value& member, const Value& value) {
-    const std::lock_guard guard(mutex_);
-    member = value;
+  void Set(Value FakeWatcher::*member, const Value& value) {
+    const base::MutexLock lock(mutex_);
+    this->*member = value;
     (void)eventfd_write(wake_.Get(), 1);
   }
   template <typename Value>
-  Value Get(const Value& member) const {
-    const std::lock_guard guard(mutex_);
-    return member;
+  Value Get(Value FakeWatcher::*member) const {
+    const base::MutexLock lock(mutex_);
+    return this->*member;
   }
 
   std::deque<Action> TakeSaid() {
-    const std::lock_guard guard(mutex_);
+    const base::MutexLock lock(mutex_);
     eventfd_t count = 0;
     (void)eventfd_read(wake_.Get(), &count);
     char events[1024];
@@ -113,15 +114,15 @@ class FakeWatcher : public Watcher {
   base::UniqueFd epoll_{epoll_create1(EPOLL_CLOEXEC)};
   base::UniqueFd wake_{eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK)};
   base::UniqueFd cookie_{inotify_init1(IN_CLOEXEC | IN_NONBLOCK)};
-  mutable std::mutex mutex_;
-  std::deque<Action> said_;
-  std::string refusal_;
-  std::string held_path_;
-  std::string calls_;
-  std::map<std::string, bool> fresh_;
-  bool holds_cookies_ = false;
-  bool is_cookie_due_ = false;
-  int touches_ = 0;
+  mutable base::Mutex mutex_;
+  std::deque<Action> said_ BASE_GUARDED_BY(mutex_);
+  std::string refusal_ BASE_GUARDED_BY(mutex_);
+  std::string held_path_ BASE_GUARDED_BY(mutex_);
+  std::string calls_ BASE_GUARDED_BY(mutex_);
+  std::map<std::string, bool> fresh_ BASE_GUARDED_BY(mutex_);
+  bool holds_cookies_ BASE_GUARDED_BY(mutex_) = false;
+  bool is_cookie_due_ BASE_GUARDED_BY(mutex_) = false;
+  int touches_ BASE_GUARDED_BY(mutex_) = 0;
 };
 
 }  // namespace ferrox::notifyd

@@ -94,10 +94,11 @@ TEST_F(WatchSetTest, WithoutScansAFolderThatAllRefuseIsAProblem) {
   set.Follow({{"test", "/queue", {{root_, 1}}}});
   (void)set.Advance(kSlice);
   EXPECT_EQ(set.StateOf({root_}).way, "none");
-  EXPECT_EQ(set.Problems(), (std::vector<std::string>{"changes of " + root_ + " are not noticed: only: is full; " +
-                                                      "periodic scan: switched off in the settings"}));
+  EXPECT_EQ(set.Roots().Problems(),
+            (std::vector<std::string>{"changes of " + root_ + " are not noticed: only: is full; " +
+                                      "periodic scan: switched off in the settings"}));
   EXPECT_EQ(Told(), "");
-  EXPECT_FALSE(set.IsWaiting()) << "there is nothing to look for every few seconds";
+  EXPECT_FALSE(set.Roots().HasMissing()) << "there is nothing to look for every few seconds";
 }
 
 TEST_F(WatchSetTest, ARefusalLaterMovesAFolderToTheNextWay) {
@@ -119,11 +120,11 @@ TEST_F(WatchSetTest, LostChangesAreComparedWhenAllIsWatchedAgain) {
   fakes_[0]->Say([](WatchListener& listener) { listener.OnLost(); });
   (void)set_->Read(0);
   EXPECT_EQ(Told(), "lost ");
-  EXPECT_TRUE(set_->IsSettingUp());
+  EXPECT_TRUE(set_->Roots().IsSettingUp());
   fakes_[0]->Say([this](WatchListener& listener) { listener.OnCovered(root_); });
   (void)set_->Read(0);
   EXPECT_EQ(Told(), "compare /root ");
-  EXPECT_FALSE(set_->IsSettingUp());
+  EXPECT_FALSE(set_->Roots().IsSettingUp());
 }
 
 TEST_F(WatchSetTest, WhatIsNoFolderIsWaitedFor) {
@@ -143,7 +144,7 @@ TEST_F(WatchSetTest, WhatIsNoFolderIsWaitedFor) {
     Follow({root_});
     EXPECT_EQ(State().way, "none");
     EXPECT_EQ(State().reason, row.what);
-    EXPECT_TRUE(set_->IsWaiting());
+    EXPECT_TRUE(set_->Roots().HasMissing());
     EXPECT_EQ(Told(), "") << "it may be on a volume that is not there yet";
     fs::remove(root_);
     fs::create_directory(root_);

@@ -15,7 +15,7 @@ namespace ferrox::notifyd {
 
 namespace {
 
-/// File systems that ask another machine for everything.
+/// File systems whose every answer comes from another machine.
 constexpr const char* kNetworkTypes[] = {"nfs",  "nfs4", "cifs",   "smb3",       "ceph",          "afs",
                                          "coda", "9p",   "lustre", "fuse.sshfs", "fuse.glusterfs"};
 
@@ -26,7 +26,8 @@ MountTable::MountTable(const char* path) : path_(path), fd_(open(path, O_RDONLY 
   changed_.clear();
 }
 
-/// "36 35 98:0 /root /mount/point options [more]... - ext4 source options"; the options may change.
+/// A line is "36 35 98:0 /root /mount/point options [more]... - ext4 source options": id, parent's id, device, root.
+/// The options may change while the mount stays.
 void MountTable::Read() {
   const Lines before = std::exchange(lines_, {});
   std::ifstream table(path_);
@@ -49,6 +50,7 @@ void MountTable::Read() {
   NoteMissing(lines_, before);
 }
 
+/// Notes the mount points of `lines` that are not in `others`.
 void MountTable::NoteMissing(const Lines& lines, const Lines& others) {
   for (const auto& [id, line] : lines) {
     const auto other = others.find(id);
@@ -74,6 +76,10 @@ bool MountTable::IsMounted(const Mount& mount) const {
   if (mount.entry.empty()) return true;  // it never was in the table, as that of a changed root is not
   const auto line = lines_.find(mount.id);
   return line != lines_.end() && line->second.entry == mount.entry;
+}
+
+bool MountTable::IsUncovered(const Mount& mount, uint64_t id) const {
+  return !IsMounted(mount) && std::find(mount.beneath.begin(), mount.beneath.end(), id) != mount.beneath.end();
 }
 
 bool MountTable::IsMountedAt(const std::string& point) const {

@@ -12,7 +12,7 @@ namespace {
 
 using Names = std::set<std::string>;
 
-/// Of a folder that is watched several times, only what all of these ignore can be left out.
+/// The names to ignore in each registered folder: of one that is registered several times, those that all ignore.
 std::map<std::string, Names> IgnoredByPath(const std::vector<Registration>& registrations) {
   std::map<std::string, Names> ignored;
   for (const Registration& registration : registrations) {
@@ -25,6 +25,7 @@ std::map<std::string, Names> IgnoredByPath(const std::vector<Registration>& regi
   return ignored;
 }
 
+/// Whether a component of the path, from that offset on, is one of the names.
 bool HasComponentOf(const std::string& path, size_t from, const Names& names) {
   for (size_t begin = from; begin < path.size();) {
     const size_t end = std::min(path.find('/', begin), path.size());

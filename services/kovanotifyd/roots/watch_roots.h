@@ -9,12 +9,12 @@
 
 namespace ferrox::notifyd {
 
-/// Whether whoever watches `outer`, and leaves out what it ignores there, sees all of `inner`, when both are on one
-/// mount.
+/// Whether watching `outer`, apart from the names that it ignores, includes everything that watching `inner` does, if
+/// both are on one mount.
 bool Covers(const WatchRoot& outer, const WatchRoot& inner);
 
-/// The folders to watch for what is registered, in ascending order of their paths: each watched folder once, without
-/// those that another one covers as far as `same_mount` says that nothing is mounted between them.
+/// The roots for what is registered, in ascending order of their paths: each registered folder once, except those that
+/// another root covers on the same mount. `same_mount` says whether nothing is mounted between two folders.
 std::vector<WatchRoot> WatchRoots(
     const std::vector<Registration>& registrations,
     const std::function<bool(const std::string& outer, const std::string& inner)>& same_mount);

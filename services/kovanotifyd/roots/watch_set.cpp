@@ -2,8 +2,9 @@
 
 #include <syslog.h>
 
-#include <algorithm>
+#include <set>
 #include <tuple>
+#include <utility>
 
 #include <kova/fs.h>
 
@@ -16,13 +17,15 @@ namespace ferrox::notifyd {
 namespace {
 
 using SteadyClock = std::chrono::steady_clock;
+using Phase = RootState::Phase;
 
 constexpr char kRemote[] = "changes that are made elsewhere on a remote file system are not reported";
-/// What all refused is offered to them again after so long.
+/// After which a root that all ways refused is offered to them again.
 constexpr std::chrono::minutes kRetryInterval{10};
+/// Of one watcher in a row, so that the others, and requests, get their turn under constant changes.
 constexpr int kReadsMax = 64;
 
-/// The watches, each with its queue, that are in the first and not in the second.
+/// The watches, each taken with its queue, that are in `now` and not in `before`.
 std::vector<QueueWatch> Added(const std::vector<Registration>& now, const std::vector<Registration>& before) {
   std::set<std::tuple<std::string, std::string, uint32_t, std::vector<std::string>>> known;
   for (const Registration& registration : before) {
@@ -41,76 +44,19 @@ std::vector<QueueWatch> Added(const std::vector<Registration>& now, const std::v
 
 }  // namespace
 
-struct WatchSet::Root {
-  enum class State { kWaiting, kSettingUp, kCovered };
-
-  WatchRoot watch;
-  State state = State::kWaiting;
-  size_t way = 0;                               ///< unless it waits; the number of ways stands for scans
-  std::string reason = {};                      ///< why it waits, or why each better way was refused
-  std::optional<FolderIdentity> identity = {};  ///< of what was watched last
-  Mount mount = {};                             ///< on which that lay
-  bool compare = true;                          ///< once covered
-  SteadyClock::time_point retry_at = {};        ///< when all have refused it
-
-  bool IsNotThere() const { return state == State::kWaiting && retry_at == SteadyClock::time_point{}; }
-  void AddReason(const std::string& name, const std::string& refusal) {
-    reason += (reason.empty() ? "" : "; ") + name + ": " + refusal;
-  }
-};
-
-/// Knows which watcher speaks.
-class WatchSet::Ear : public WatchListener {
- public:
-  Ear(WatchSet& set, size_t way) : set_(set), way_(way) {}
-
-  void OnChange(Change change) override { set_.listener_.OnChange(std::move(change)); }
-
-  void OnCovered(const std::string& path) override {
-    Root* root = set_.Find(way_, path);
-    if (root == nullptr) return;
-    root->state = Root::State::kCovered;
-    if (std::exchange(root->compare, true)) set_.listener_.OnCompare(path);
-  }
-
-  void OnRefused(const std::string& path, const std::string& reason) override {
-    Root* root = set_.Find(way_, path);
-    if (root == nullptr) return;
-    root->AddReason(set_.ways_[way_].name, reason);
-    ++root->way;
-    set_.TryNext(*root);
-  }
-
-  void OnLost() override {
-    for (auto& [path, root] : set_.roots_) {
-      if (root.way == way_ && root.state == Root::State::kCovered) root.state = Root::State::kSettingUp;
-    }
-    set_.listener_.OnLost(way_);
-  }
-
-  void OnRootDisturbed(const std::string&) override { set_.disturbed_ = true; }
-  void OnCookie() override { set_.listener_.OnCookie(way_); }
-
- private:
-  WatchSet& set_;
-  size_t way_;
-};
-
 WatchSet::WatchSet(std::vector<Way> ways, bool scans, Listener& listener)
-    : ways_(std::move(ways)), scans_(scans), listener_(listener) {
-  for (size_t way = 0; way < ways_.size(); ++way) ears_.push_back(std::make_unique<Ear>(*this, way));
-}
+    : ways_(std::move(ways)), scans_(scans), listener_(listener) {}
 
-WatchSet::~WatchSet() = default;
-
-/// What joins a folder that is covered already is compared: it may have changed since its application looked at it.
+/// What a queue begins to watch in a folder that is covered already is compared: it may have changed since the queue's
+/// owner read it.
 void WatchSet::Follow(std::vector<Registration> registrations) {
   const std::vector<QueueWatch> added = Added(registrations, registrations_);
   registrations_ = std::move(registrations);
   Examine();
   for (const QueueWatch& watch : added) {
-    const Root* root = RootOf(watch);
-    if (root != nullptr && root->state == Root::State::kCovered) listener_.OnCompare(watch.path);
+    const RootState* root = roots_.CoveringRoot(watch);
+    const bool is_covered = root != nullptr && (root->phase == Phase::kCovered || root->phase == Phase::kScanned);
+    if (is_covered) listener_.OnCompare(watch.path);
   }
 }
 
@@ -119,17 +65,19 @@ void WatchSet::Examine() {
   mounts_.Read();
   const std::set<std::string> disturbed = guard_.Read();
   const auto is_on_one_mount = [this](const std::string& outer, const std::string& inner) {
-    const FolderLook above = Look(outer);
-    const FolderLook below = Look(inner);
+    const FolderProbe above = ProbeFolder(outer, mounts_);
+    const FolderProbe below = ProbeFolder(inner, mounts_);
     return above.problem.empty() && below.problem.empty() && below.identity.IsOnMountOf(above.identity);
   };
-  ChangeRoots(WatchRoots(registrations_, is_on_one_mount));
+  RootTable::Roots dropped = roots_.Replace(WatchRoots(registrations_, is_on_one_mount));
+  for (auto& [path, root] : dropped) Stop(root);
   for (auto& [path, root] : roots_) ExamineRoot(root, disturbed.count(path) != 0);
   for (const std::string& point : mounts_.TakeChanged()) OnMountChanged(point);
 }
 
-/// What is mounted below a folder hides what is there, which comes to light again afterwards. A registered folder there
-/// is looked at as such, since it may lie on the volume that went.
+/// What is mounted below a root hides what is there, which is visible again when it is unmounted: both are compared. A
+/// watcher with a watch for each folder has none for those that were hidden, so the root is set up again. Where a
+/// registered folder lies there, ExamineRoot has done what is due, since that folder may lie on the volume.
 void WatchSet::OnMountChanged(const std::string& point) {
   for (const Registration& registration : registrations_) {
     for (const QueueWatch& watch : registration.watches) {
@@ -138,135 +86,84 @@ void WatchSet::OnMountChanged(const std::string& point) {
   }
   bool is_below = false;
   for (auto& [path, root] : roots_) {
-    if (root.state == Root::State::kWaiting || !base::IsAtOrBelow(point, path)) continue;
+    if (!root.IsWatched() || !base::IsAtOrBelow(point, path)) continue;
     is_below = true;
-    const bool may_lack_watches = !IsScanned(root) && ways_[root.way].watcher->WatchesEachFolder();
+    const bool may_lack_watches = root.phase != Phase::kScanned && ways_[root.way].watcher->WatchesEachFolder();
     if (may_lack_watches && !mounts_.IsMountedAt(point)) ExamineRoot(root, true);
   }
   if (is_below) listener_.OnCompare(point);
 }
 
-/// A folder whose server may not answer is taken for what it is said to be.
-FolderLook WatchSet::Look(const std::string& path) const {
-  const uint64_t mount = mounts_.MountOf(path);
-  FolderLook look;
-  if (mounts_.IsNetwork(mount)) {
-    look.result = FolderLook::Result::kUsable;
-  } else {
-    look = LookAtFolder(path);
-  }
-  if (look.identity.mount == 0) look.identity.mount = mount;
-  return look;
+/// Begins anew with a root when it was disturbed, when its folder is another one, or when it waits and may be tried.
+void WatchSet::ExamineRoot(RootState& root, bool is_disturbed) {
+  const FolderProbe probe = ProbeFolder(root.watch.path, mounts_);
+  if (probe.result != FolderProbe::Result::kUsable) return OnUnusable(root, probe);
+  const bool is_new = is_disturbed || root.identity != probe.identity;
+  if (is_new || (!root.IsWatched() && SteadyClock::now() >= root.retry_at)) Begin(root, probe);
 }
 
-void WatchSet::ChangeRoots(const std::vector<WatchRoot>& roots) {
-  Roots kept;
-  for (const WatchRoot& watch : roots) {
-    const auto known = roots_.find(watch.path);
-    if (known != roots_.end() && known->second.watch.ignore == watch.ignore) {
-      kept.insert(roots_.extract(known));
-    } else {
-      kept.emplace(watch.path, Root{watch});
-    }
-  }
-  for (auto& [path, root] : roots_) Stop(root);
-  roots_ = std::move(kept);
-}
-
-void WatchSet::ExamineRoot(Root& root, bool is_disturbed) {
-  const FolderLook look = Look(root.watch.path);
-  const bool was_watched = root.state != Root::State::kWaiting;
-  if (look.result != FolderLook::Result::kUsable) {
-    Stop(root);
-    root.reason = look.problem;
-    root.retry_at = {};
-    if (was_watched)
-      Log(LOG_WARNING, "%s is not watched any more: it %s", root.watch.path.c_str(), look.problem.c_str());
-    const bool was_removed = look.result == FolderLook::Result::kGone && mounts_.IsMounted(root.mount);
-    if (was_watched && was_removed) listener_.OnCompare(root.watch.path);
-    return;
-  }
-  const bool is_new = is_disturbed || root.identity != look.identity;
-  if (is_new || (!was_watched && SteadyClock::now() >= root.retry_at)) Begin(root, look);
-}
-
-/// Whether the folder came to light because what had been mounted over it went.
-bool WatchSet::IsUncovered(const Root& root, const FolderLook& look) const {
-  const std::vector<uint64_t>& beneath = root.mount.beneath;
-  return !mounts_.IsMounted(root.mount) &&
-         std::find(beneath.begin(), beneath.end(), look.identity.mount) != beneath.end();
-}
-
-void WatchSet::Begin(Root& root, const FolderLook& look) {
+void WatchSet::OnUnusable(RootState& root, const FolderProbe& probe) {
+  const bool was_watched = root.IsWatched();
   Stop(root);
-  root.compare = !IsUncovered(root, look);
-  root.identity = look.identity;
-  root.mount = mounts_.Find(look.identity.mount);
+  root.reason = probe.problem;
+  root.retry_at = {};
+  if (!was_watched) return;
+  Log(LOG_WARNING, "%s is not watched any more: it %s", root.watch.path.c_str(), probe.problem.c_str());
+  const bool was_removed = probe.result == FolderProbe::Result::kGone && mounts_.IsMounted(root.mount);
+  if (was_removed) listener_.OnCompare(root.watch.path);
+}
+
+/// A folder that is only visible again since what was mounted over it is gone is not compared.
+void WatchSet::Begin(RootState& root, const FolderProbe& probe) {
+  Stop(root);
+  root.compare = !mounts_.IsUncovered(root.mount, probe.identity.mount);
+  root.identity = probe.identity;
+  root.mount = mounts_.Find(probe.identity.mount);
   root.way = 0;
   root.reason.clear();
-  if (!mounts_.IsNetwork(look.identity.mount)) guard_.Add(root.watch.path);
-  TryNext(root);
+  if (!mounts_.IsNetwork(probe.identity.mount)) guard_.Add(root.watch.path);
+  TryNextWay(root);
 }
 
-void WatchSet::Stop(Root& root) {
-  if (root.state == Root::State::kWaiting) return;
+void WatchSet::Stop(RootState& root) {
+  if (!root.IsWatched()) return;
   guard_.Remove(root.watch.path);
-  if (!IsScanned(root)) ways_[root.way].watcher->Remove(root.watch.path);
-  root.state = Root::State::kWaiting;
+  if (root.phase != Phase::kScanned) ways_[root.way].watcher->Remove(root.watch.path);
+  root.phase = Phase::kWaiting;
 }
 
-void WatchSet::TryNext(Root& root) {
+/// Gives the root to the first watcher from `root.way` on that may have it.
+void WatchSet::TryNextWay(RootState& root) {
   const std::string& path = root.watch.path;
   const bool is_remote = mounts_.IsNetwork(root.mount.id) || KOVAFSIsRemoteFS(KOVAGetFSType(path.c_str(), 0)) == 1;
   for (; root.way < ways_.size(); ++root.way) {
     const Way& way = ways_[root.way];
     if (way.watcher != nullptr && !is_remote) {
-      root.state = Root::State::kSettingUp;
+      root.phase = Phase::kSettingUp;
       way.watcher->Add(root.watch);
       return;
     }
     root.AddReason(way.name, way.watcher != nullptr ? kRemote : way.refusal);
   }
   if (scans_) {
-    root.state = Root::State::kCovered;
-    if (std::exchange(root.compare, true)) listener_.OnCompare(root.watch.path);
-    return;
+    root.phase = Phase::kScanned;
+    return CompareIfDue(root);
   }
   root.AddReason(kPeriodicScan, "switched off in the settings");
-  root.state = Root::State::kWaiting;
+  root.phase = Phase::kWaiting;
   root.retry_at = SteadyClock::now() + kRetryInterval;
   guard_.Remove(root.watch.path);
 }
 
-WatchSet::Root* WatchSet::Find(size_t way, const std::string& path) {
-  const auto found = roots_.find(path);
-  const bool is_its = found != roots_.end() && found->second.state != Root::State::kWaiting && found->second.way == way;
-  return is_its ? &found->second : nullptr;
-}
-
-/// The folder itself, or the nearest one that covers it.
-const WatchSet::Root* WatchSet::RootOf(const QueueWatch& watch) const {
-  const Root* nearest = nullptr;
-  for (const auto& [path, root] : roots_) {
-    if (Covers(root.watch, {watch.path, watch.ignore})) nearest = &root;
-  }
-  return nearest;
-}
-
-bool WatchSet::IsScanned(const Root& root) const {
-  return root.state == Root::State::kCovered && root.way == ways_.size();
-}
-
-bool WatchSet::IsCovering(size_t way) const {
-  return std::any_of(roots_.begin(), roots_.end(), [way](const auto& entry) {
-    return entry.second.state == Root::State::kCovered && entry.second.way == way;
-  });
+void WatchSet::CompareIfDue(RootState& root) {
+  if (std::exchange(root.compare, true)) listener_.OnCompare(root.watch.path);
 }
 
 bool WatchSet::Read(size_t way) {
   if (ways_[way].watcher == nullptr) return true;
+  active_way_ = way;
   for (int i = 0; i < kReadsMax; ++i) {
-    if (!ways_[way].watcher->Read(*ears_[way])) return true;
+    if (!ways_[way].watcher->Read(*this)) return true;
   }
   return false;
 }
@@ -274,50 +171,56 @@ bool WatchSet::Read(size_t way) {
 bool WatchSet::Advance(std::chrono::milliseconds at_most) {
   bool is_more = false;
   for (size_t way = 0; way < ways_.size(); ++way) {
-    if (ways_[way].watcher != nullptr && ways_[way].watcher->Advance(at_most, *ears_[way])) is_more = true;
+    active_way_ = way;
+    if (ways_[way].watcher != nullptr && ways_[way].watcher->Advance(at_most, *this)) is_more = true;
   }
   return is_more;
 }
 
 void WatchSet::Scan() {
   for (const auto& [path, root] : roots_) {
-    if (IsScanned(root)) listener_.OnCompare(path);
+    if (root.phase == Phase::kScanned) listener_.OnCompare(path);
   }
 }
 
-bool WatchSet::HasScans() const {
-  return std::any_of(roots_.begin(), roots_.end(), [this](const auto& entry) { return IsScanned(entry.second); });
+void WatchSet::OnChange(Change change) { listener_.OnChange(std::move(change)); }
+
+void WatchSet::OnCovered(const std::string& path) {
+  RootState* root = roots_.Find(active_way_, path);
+  if (root == nullptr) return;
+  root->phase = Phase::kCovered;
+  CompareIfDue(*root);
 }
 
-bool WatchSet::IsSettingUp() const {
-  return std::any_of(roots_.begin(), roots_.end(),
-                     [](const auto& entry) { return entry.second.state == Root::State::kSettingUp; });
+void WatchSet::OnRefused(const std::string& path, const std::string& reason) {
+  RootState* root = roots_.Find(active_way_, path);
+  if (root == nullptr) return;
+  root->AddReason(ways_[active_way_].name, reason);
+  ++root->way;
+  TryNextWay(*root);
 }
 
-bool WatchSet::IsWaiting() const {
-  return std::any_of(roots_.begin(), roots_.end(), [](const auto& entry) { return entry.second.IsNotThere(); });
+void WatchSet::OnLost() {
+  for (auto& [path, root] : roots_) {
+    if (root.phase == Phase::kCovered && root.way == active_way_) root.phase = Phase::kSettingUp;
+  }
+  listener_.OnLost(active_way_);
 }
+
+void WatchSet::OnRootDisturbed(const std::string&) { disturbed_ = true; }
+void WatchSet::OnCookie() { listener_.OnCookie(active_way_); }
 
 WatchState WatchSet::StateOf(const QueueWatch& watch) const {
-  const Root* root = RootOf(watch);
+  const RootState* root = roots_.CoveringRoot(watch);
   if (root == nullptr) return {};
   WatchState state;
   state.reason = root->reason;
-  if (root->state == Root::State::kWaiting) return state;
-  const bool is_scanned = IsScanned(*root);
+  if (!root->IsWatched()) return state;
+  const bool is_scanned = root->phase == Phase::kScanned;
   state.way = is_scanned ? kPeriodicScan : ways_[root->way].name;
-  state.covered = !is_scanned && root->state == Root::State::kCovered;
+  state.covered = root->phase == Phase::kCovered;
   state.kernel_watches = is_scanned ? 0 : ways_[root->way].watcher->Watches(root->watch.path);
   return state;
-}
-
-std::vector<std::string> WatchSet::Problems() const {
-  std::vector<std::string> problems;
-  for (const auto& [path, root] : roots_) {
-    if (root.state != Root::State::kWaiting) continue;
-    problems.push_back("changes of " + path + " are not noticed: " + (root.IsNotThere() ? "it " : "") + root.reason);
-  }
-  return problems;
 }
 
 }  // namespace ferrox::notifyd

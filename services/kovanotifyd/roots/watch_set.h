@@ -4,117 +4,110 @@
 
 #include <chrono>
 #include <cstdint>
-#include <map>
 #include <memory>
-#include <optional>
-#include <set>
 #include <string>
 #include <vector>
 
 #include "services/kovanotifyd/registry.h"
-#include "services/kovanotifyd/roots/folder_look.h"
+#include "services/kovanotifyd/roots/folder_probe.h"
 #include "services/kovanotifyd/roots/mount_table.h"
 #include "services/kovanotifyd/roots/root_guard.h"
+#include "services/kovanotifyd/roots/root_table.h"
 #include "services/kovanotifyd/watcher.h"
 
 namespace ferrox::notifyd {
 
 inline constexpr char kPeriodicScan[] = "periodic scan";
 
-/// A way to learn of changes.
+/// A way to learn of changes. Ways are numbered from 0, the best first.
 struct Way {
   std::string name;
-  std::unique_ptr<Watcher> watcher;  ///< null: it is not to be used,
-  std::string refusal = {};          ///< and why, without a full stop
+  std::unique_ptr<Watcher> watcher;  ///< null when it cannot be used,
+  std::string refusal = {};          ///< for this reason, without a full stop
 };
 
-/// What people can see of the watching of one folder.
+/// What people can see of how one folder is watched.
 struct WatchState {
   std::string way = "none";
   std::string reason = {};  ///< why it is not watched, or not in a better way; "" when it is watched in the best one
-  bool covered = false;     ///< whether each change is noticed
+  bool covered = false;     ///< whether every change is noticed
   uint64_t kernel_watches = 0;
 };
 
-/// Which folder is watched in which way: the first that does not refuse it, and a comparison of all of it now and then
-/// where all do. Folders that are not there, or are no folders, wait until they are. A folder that comes, or comes
-/// again, is compared when it is covered; one that was removed is compared too, but not one that went with its volume.
-/// Belongs to one thread.
-class WatchSet {
+/// Decides which folders are roots and in which way each is watched: the first way that does not refuse it, or, when
+/// all refuse, by a comparison of the whole root at intervals. A root whose folder is missing or unusable waits until
+/// there is one. A folder that is there again, or is another one than before, is compared once it is covered; so is one
+/// that was removed, but not one that went away with its volume. Belongs to one thread.
+class WatchSet : private WatchListener {
  public:
-  /// Whom it tells.
+  /// Gets what the watchers report of all roots. Called during Follow, Examine, Read, Advance and Scan.
   class Listener {
    public:
     virtual ~Listener() = default;
     virtual void OnChange(Change change) = 0;
     /// Disk and index may differ at and below the path.
     virtual void OnCompare(const std::string& path) = 0;
-    /// The watcher of that number lost changes; comparisons follow.
+    /// The watcher of that way lost changes. OnCompare follows for its roots.
     virtual void OnLost(size_t way) = 0;
+    /// As WatchListener::OnCookie, for the watcher of that way.
     virtual void OnCookie(size_t way) = 0;
   };
 
-  /// `ways`: the best first. `scans`: whether what nobody can watch is compared now and then.
+  /// `scans`: whether roots that all watchers refuse are compared at intervals; else they wait.
   WatchSet(std::vector<Way> ways, bool scans, Listener& listener);
   WatchSet(const WatchSet&) = delete;
   WatchSet& operator=(const WatchSet&) = delete;
-  ~WatchSet();
 
-  /// What is registered from now on. Folders that stay as they are are left alone.
+  /// Takes what is registered from now on. Nothing happens to roots that stay as they are.
   void Follow(std::vector<Registration> registrations);
-  /// Looks whether each folder is still the one that is watched, and for those that wait.
+  /// Examines whether each root's folder is still the one that is watched, and whether there is one for roots that
+  /// wait.
   void Examine();
-  /// Whether something happened that calls for Examine.
+  /// Whether a watcher reported something that calls for Examine.
   bool IsDisturbed() const { return disturbed_; }
-  /// To be polled, calling for Examine. The mount table is always readable: only POLLPRI tells of a change.
+  /// Descriptors that call for Examine when poll reports the events given here. The mount table's is always readable,
+  /// and reports a change as POLLPRI.
   std::vector<pollfd> Disturbances() const { return {{guard_.Fd(), POLLIN, 0}, {mounts_.Fd(), POLLPRI, 0}}; }
 
   size_t Ways() const { return ways_.size(); }
   const std::string& NameOf(size_t way) const { return ways_[way].name; }
-  /// Readable when Read has something to do; -1: never.
+  /// As Watcher::Fd; -1 also for a way that cannot be used.
   int FdOf(size_t way) const { return ways_[way].watcher != nullptr ? ways_[way].watcher->Fd() : -1; }
-  /// Whether a folder is watched that way, already covered.
-  bool IsCovering(size_t way) const;
-  /// Takes what has happened; false when that was not yet all.
+  /// Reads what the way's watcher has to report. False when more may be waiting after many reads.
   bool Read(size_t way);
-  /// Goes on with what takes time, for about `at_most`; false when nothing is left to do.
+  /// As Watcher::Advance, for each watcher.
   bool Advance(std::chrono::milliseconds at_most);
-
-  /// Compares what nobody can watch.
+  /// Asks for the comparison of all roots that no watcher watches.
   void Scan();
-  bool HasScans() const;
-  bool IsSettingUp() const;
-  bool IsWaiting() const;
 
+  const RootTable& Roots() const { return roots_; }
   WatchState StateOf(const QueueWatch& watch) const;
-  /// A sentence for each folder whose changes are not noticed at all.
-  std::vector<std::string> Problems() const;
 
  private:
-  struct Root;
-  class Ear;
-  using Roots = std::map<std::string, Root>;
+  // Of the watcher that is being called, which is that of active_way_.
+  void OnChange(Change change) override;
+  void OnCovered(const std::string& path) override;
+  void OnRefused(const std::string& path, const std::string& reason) override;
+  void OnLost() override;
+  void OnRootDisturbed(const std::string& path) override;
+  void OnCookie() override;
 
-  FolderLook Look(const std::string& path) const;
-  void ChangeRoots(const std::vector<WatchRoot>& roots);
   void OnMountChanged(const std::string& point);
-  void ExamineRoot(Root& root, bool is_disturbed);
-  void Begin(Root& root, const FolderLook& look);
-  void Stop(Root& root);
-  void TryNext(Root& root);
-  bool IsUncovered(const Root& root, const FolderLook& look) const;
-  Root* Find(size_t way, const std::string& path);
-  const Root* RootOf(const QueueWatch& watch) const;
-  bool IsScanned(const Root& root) const;
+  void ExamineRoot(RootState& root, bool is_disturbed);
+  void OnUnusable(RootState& root, const FolderProbe& probe);
+  void Begin(RootState& root, const FolderProbe& probe);
+  void Stop(RootState& root);
+  void TryNextWay(RootState& root);
+  void CompareIfDue(RootState& root);
 
   std::vector<Way> ways_;
-  std::vector<std::unique_ptr<Ear>> ears_;  ///< one a way: its watcher's listener
   bool scans_;
   Listener& listener_;
+  size_t active_way_ = 0;
   MountTable mounts_;
   RootGuard guard_;
   std::vector<Registration> registrations_;
-  Roots roots_;
+  RootTable roots_;
   bool disturbed_ = false;
 };
 

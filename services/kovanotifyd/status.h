@@ -1,0 +1,37 @@
+#pragma once
+
+#include <cstdint>
+#include <string>
+#include <vector>
+
+#include "services/kovanotifyd/queues/queue_router.h"
+#include "services/kovanotifyd/registry.h"
+#include "services/kovanotifyd/roots/watch_set.h"
+
+namespace ferrox::notifyd {
+
+/// What people can see of one registration.
+struct QueueStatus {
+  struct Watch {
+    std::string path;
+    WatchState state;
+  };
+
+  std::string queue;
+  std::string application;
+  std::vector<Watch> watches;
+  QueueFigures figures;
+};
+
+/// What people can see of the daemon.
+struct NotifierStatus {
+  std::vector<QueueStatus> queues = {};
+  uint64_t changes = 0;                    ///< reported by the kernel
+  uint64_t lost = 0;                       ///< how many times the kernel dropped some
+  std::vector<std::string> problems = {};  ///< sentences
+};
+
+/// Of each registration, in the registry's order.
+std::vector<QueueStatus> QueueStatusOf(const Registry& registry, const WatchSet& watches, const QueueRouter& router);
+
+}  // namespace ferrox::notifyd
