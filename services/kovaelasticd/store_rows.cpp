@@ -1,10 +1,17 @@
+#define FERROX_SOURCE "sqlite_store_write"
+
 #include "services/kovaelasticd/store_rows.h"
 
 #include <algorithm>
 
+#include "common/log.h"
+
 namespace ferrox::engine {
 
 namespace {
+
+/// More names than that come from no extractor.
+constexpr int64_t kFieldNamesMax = 4096;
 
 unsigned char LowerAscii(char c) { return static_cast<unsigned char>(c >= 'A' && c <= 'Z' ? c + ('a' - 'A') : c); }
 
@@ -73,6 +80,20 @@ void LoadFieldNames(Database& database, FieldNames& names) {
   Statement statement = database.Prepare("SELECT number, name FROM fields WHERE number > ?1 ORDER BY number");
   statement.Bind(1, names.Largest());
   while (statement.Step()) names.Add(statement.Int(0), std::string(statement.Text(1)));
+}
+
+void AddFieldNames(Database& database, FieldNames& names, const Json::Value& document) {
+  for (const std::string& name : NamesNeeded(document, names)) {
+    const int64_t number = names.Largest() + 1;
+    FERROX_FAIL_IF(number > kFieldNamesMax, Error::kEngineBadRequest,
+                   "field \"" + name + "\" is one too many: an index holds at most " + std::to_string(kFieldNamesMax) +
+                       " different field names");
+    database.Prepare("INSERT INTO fields(number, name) VALUES(?1, ?2)")
+        .Bind(1, number)
+        .Bind(2, std::string_view(name))
+        .Run();
+    names.Add(number, name);
+  }
 }
 
 PrefixRange::PrefixRange(std::string prefix) : begin_(prefix) {

@@ -39,6 +39,9 @@ void SaveTotals(Database& database, const Totals& totals);
 
 /// Reads the names that were added since the last call.
 void LoadFieldNames(Database& database, FieldNames& names);
+/// Gives each member of `document` that has no number one, in the table and in `names`.
+/// @throws Error kEngineBadRequest when the index has too many names then.
+void AddFieldNames(Database& database, FieldNames& names, const Json::Value& document);
 
 /// Binds the range of all texts that begin with `prefix` to the parameters 1 (from) and 2 (before).
 class PrefixRange {

@@ -1,7 +1,10 @@
-#include <algorithm>
-#include <cstdlib>
+#include "services/kovaelasticd/suggest.h"
 
-#include "services/kovaelasticd/sqlite_search.h"
+#include <algorithm>
+#include <string_view>
+#include <utility>
+
+#include "services/kovaelasticd/store_rows.h"
 
 namespace ferrox::engine {
 
@@ -10,7 +13,8 @@ namespace {
 constexpr size_t kSuggestedMax = 3;
 constexpr size_t kShortestWord = 3;
 
-/// The number of letters to insert, remove, change or swap with the next; `limit` + 1 when there are more.
+/// The number of bytes to insert, remove, change or swap with the next one (Damerau-Levenshtein, computed row by row);
+/// `limit` + 1 when there are more. Words are folded, so a byte is a letter in Latin script.
 size_t EditDistance(std::string_view a, std::string_view b, size_t limit) {
   if (a.size() > b.size()) std::swap(a, b);
   if (b.size() - a.size() > limit) return limit + 1;
@@ -32,20 +36,19 @@ size_t EditDistance(std::string_view a, std::string_view b, size_t limit) {
   return std::min(last[a.size()], limit + 1);
 }
 
-}  // namespace
+struct Known {
+  size_t distance;
+  int64_t documents;
+  std::string word;
+};
 
-/// Known words like `word`, with the same first letter: the nearest first, then those in the most documents.
-std::vector<std::string> Searcher::SuggestWord(const std::string& word) {
-  struct Known {
-    size_t distance;
-    int64_t documents;
-    std::string word;
-  };
+/// Known words like `word`, with the same first letter: the nearest first, then those in the most documents. A word of
+/// up to five bytes may differ in one letter, a longer one in two.
+std::vector<std::string> SuggestWord(Database& database, const std::string& word) {
   if (word.size() < kShortestWord) return {};
   const size_t limit = word.size() < 6 ? 1 : 2;
   std::vector<Known> candidates;
-  Statement statement =
-      reader_.database.Prepare("SELECT word, documents FROM suggestions WHERE word >= ?1 AND word < ?2");
+  Statement statement = database.Prepare("SELECT word, documents FROM suggestions WHERE word >= ?1 AND word < ?2");
   const PrefixRange range(word.substr(0, 1));  // the statement refers to its texts
   range.Bind(statement);
   while (statement.Step()) {
@@ -63,31 +66,31 @@ std::vector<std::string> Searcher::SuggestWord(const std::string& word) {
   return words;
 }
 
-std::vector<std::string> Searcher::Suggest() {
+}  // namespace
+
+std::vector<std::string> Suggest(Database& database, const std::vector<std::string>& words) {
   std::vector<std::string> suggestions;
-  for (const std::string& word : words_) {
-    for (std::string& similar : SuggestWord(word)) {
+  for (const std::string& word : words) {
+    for (std::string& similar : SuggestWord(database, word)) {
       if (suggestions.size() < kSuggestedMax) suggestions.push_back(std::move(similar));
     }
   }
   return suggestions;
 }
 
-void SqliteStore::RebuildSuggestions() {
-  Begin();
-  Flush();
-  writer_.Execute(
+void RebuildSuggestions(Database& database) {
+  // fts5vocab lists the words of a full-text table: 'row' each once, 'col' once for each column.
+  database.Execute(
       "CREATE VIRTUAL TABLE IF NOT EXISTS temp.content_words USING fts5vocab('main', 'content_fts', 'row')");
-  writer_.Execute("CREATE VIRTUAL TABLE IF NOT EXISTS temp.meta_words USING fts5vocab('main', 'meta_fts', 'col')");
-  writer_.Execute("DELETE FROM suggestions");
+  database.Execute("CREATE VIRTUAL TABLE IF NOT EXISTS temp.meta_words USING fts5vocab('main', 'meta_fts', 'col')");
+  database.Execute("DELETE FROM suggestions");
   // Words in the most documents, from names and titles too; a single occurrence is as likely an error itself.
-  writer_.Execute(
+  database.Execute(
       "INSERT OR IGNORE INTO suggestions SELECT term, doc FROM temp.content_words"
       " WHERE doc > 1 AND length(term) BETWEEN 4 AND 24 AND term NOT GLOB '[0-9]*' ORDER BY doc DESC LIMIT 50000");
-  writer_.Execute(
+  database.Execute(
       "INSERT OR IGNORE INTO suggestions SELECT term, doc FROM temp.meta_words WHERE col IN ('name', 'title')"
       " AND length(term) BETWEEN 4 AND 24 AND term NOT GLOB '[0-9]*' ORDER BY doc DESC LIMIT 10000");
-  uncommitted_bytes_ += 1;
 }
 
 }  // namespace ferrox::engine
