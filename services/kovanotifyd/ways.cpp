@@ -27,7 +27,7 @@ std::unique_ptr<Watcher> MakeFilesystemWatcher(const std::string& cookie_path, s
   for (const std::string& path : OwnPaths()) {
     if (path.back() == '/') options.quiet_folders.push_back(path);
   }
-  return std::make_unique<FilesystemWatcher>(std::move(options));
+  return std::make_unique<FilesystemWatcher>(options);
 }
 
 std::unique_ptr<Watcher> MakeInodeWatcher(const std::string& cookie_path, std::string& refusal) {

@@ -1,40 +1,43 @@
 #pragma once
 
+#include <cstddef>
 #include <map>
-#include <memory>
 #include <string>
-#include <unordered_map>
 #include <vector>
 
 #include "services/kovanotifyd/fan_group.h"
+#include "services/kovanotifyd/filesystem/fan_record_translator.h"
+#include "services/kovanotifyd/filesystem/filesystem_marks.h"
 #include "services/kovanotifyd/filesystem/folder_cache.h"
 #include "services/kovanotifyd/filesystem/folder_locator.h"
 #include "services/kovanotifyd/filesystem/linked_files.h"
 #include "services/kovanotifyd/filesystem/mounted_folders.h"
-#include "services/kovanotifyd/filesystem/record_window.h"
+#include "services/kovanotifyd/filesystem/path_finder.h"
+#include "services/kovanotifyd/filesystem/record_queue.h"
 #include "services/kovanotifyd/filesystem/rename_history.h"
 #include "services/kovanotifyd/filesystem/watched_roots.h"
 #include "services/kovanotifyd/watcher.h"
 
 namespace ferrox::notifyd {
 
-/// Watches roots by one mark for each file system that they are on, so that a root costs nothing however many folders
-/// it has. The kernel then tells of everything on the file system; what is outside of all roots is dropped here,
-/// unless it may be a change of a file with another name below a root (LinkedFiles), and what is in the daemons' own
-/// folders mostly before it gets here. Names to ignore are reported all the same. Paths are
-/// those of the moment of each change, however far the reader is behind (FolderLocator). Only names to which something
-/// returned while records were waiting can be told wrongly; they are then reported as kUncertain.
-class FilesystemWatcher : public Watcher, private FolderSource {
+/// Watches roots by one mark for each file system that has some, so that a root costs the same however many folders it
+/// has. The kernel then reports everything on the file system. What lies outside of all roots is dropped here, unless
+/// it may be a change of a file that has another name in a root (LinkedFiles); what lies in the daemons' own folders
+/// the kernel mostly leaves out (FilesystemMarks). Names to ignore are reported all the same.
+///
+/// Read takes records from the kernel (RecordQueue); FanRecordTranslator turns each into changes, with the paths of the
+/// moment of the record, however far the reader is behind (FolderLocator). Only a name to which something came back
+/// while records were waiting can be reported wrongly; it is then also reported as kUncertain (RenameHistory).
+class FilesystemWatcher : public Watcher {
  public:
   struct Options {
-    std::string cookie;                           ///< a file's path; its folder is marked
+    std::string cookie;                           ///< path of the cookie file; its folder is marked
     std::vector<std::string> quiet_folders = {};  ///< where the daemons keep their own files
     size_t folders_max = 16384;                   ///< whose places are kept in memory
-    size_t records_max = 65536;  ///< read and not yet worked through; beyond these, changes count as lost
+    size_t records_max = 65536;                   ///< that are read ahead; when there are more, changes count as lost
   };
 
-  explicit FilesystemWatcher(Options options);
-  ~FilesystemWatcher() override;
+  explicit FilesystemWatcher(const Options& options);
 
   const char* Name() const override { return "fanotify"; }
   void Add(const WatchRoot& root) override;
@@ -45,59 +48,26 @@ class FilesystemWatcher : public Watcher, private FolderSource {
   uint64_t Watches(const std::string& root) const override { return roots_.Has(root) ? 1 : 0; }
 
  private:
-  using Folder = FolderCache::Folder;
-  using Paths = std::vector<std::string>;
-
-  // Setting up.
   std::string Begin(const std::string& root);
-  std::string OpenGroup();
-  std::string MarkFileSystem(const std::string& root, int folder, const HandleKey& key);
-  void ReleaseFileSystem(const HandleKey& key);
-  void FindQuietFolders();
-
-  // The queue of records.
-  Answer ReadPlace(const HandleKey& folder, FolderPlace& place) override;
-  void Drain(RecordWindow& window) override;
-  bool ReadBatch();
-  void WorkThroughWindow(WatchListener& listener);
+  std::string Locate(const std::string& root, const HandleKey& key);
+  void ReleaseUnused(const HandleKey& key);
+  void TranslateWindow(WatchListener& listener);
+  void ReportDoubts(WatchListener& listener);
+  void OnLost(WatchListener& listener);
   void Rest();
-  void Settle(WatchListener& listener);
-  void Lose(WatchListener& listener);
 
-  // One record.
-  void Take(const FanRecord& record, WatchListener& listener);
-  void TakeRename(const FanRecord& record, WatchListener& listener);
-  void TellByNumber(const FanRecord& record, WatchListener& listener);
-  void TakeName(const FanRecord& record, WatchListener& listener);
-  void Disturb(const FanRecord& record, WatchListener& listener);
-  void Silence(const FanRecord& record);
-  bool FindPaths(const HandleKey& folder, std::string_view name, Paths& paths, WatchListener& listener);
-  bool IsExchange(const FanRecord& record) const;
-  void TellUnknown(const HandleKey& folder, WatchListener& listener);
-
-  const Options options_;
   FanGroup group_;
   MountedFolders mounts_;
+  FilesystemMarks marks_;
+  RecordQueue queue_;
   FolderCache cache_;
-  RecordWindow window_;
   FolderLocator locator_;
   WatchedRoots roots_;
+  PathFinder finder_;
   RenameHistory history_;
   LinkedFiles linked_;
-
-  std::map<std::string, WatchRoot> to_add_;
-  /// Folders that were told to be made and removed by one record, while what was done in them is still to come.
-  std::unordered_map<HandleKey, FolderPlace> removed_;
-  HandleKey cookie_folder_;
-  std::string cookie_name_;
-  FanRecord last_rename_;           ///< without names, which would outlive their batch,
-  std::string last_names_[2] = {};  ///< but with these
-  bool can_ignore_ = true;
-  bool is_overrun_ = false;
-  bool was_burst_ = false;
-  bool told_unknown_ = false;
-  Paths paths_;
-  Paths new_paths_;
+  FanRecordTranslator translator_;
+  std::map<std::string, WatchRoot> to_add_;  ///< roots that Advance is to begin with
 };
 
 }  // namespace ferrox::notifyd

@@ -19,7 +19,7 @@ void LinkedFiles::OnLinks(const HandleKey& file) {
   linked_.insert(file);
 }
 
-std::optional<uint64_t> LinkedFiles::NumberToTell(const FanRecord& record) {
+std::optional<uint64_t> LinkedFiles::NumberToReport(const FanRecord& record) {
   if (record.target.empty() || alone_.count(record.target) != 0) return 0;
   const bool is_new = (record.mask & FAN_CREATE) != 0 && !has_forgotten_ && linked_.count(record.target) == 0;
   if (!is_new) return LookAt(record);

@@ -25,7 +25,7 @@ class LinkedFiles {
   void OnLinks(const HandleKey& file);
   /// The number of the file that the record tells a change of, when it has to be told; 0 when not. Nothing when that
   /// cannot be found out.
-  std::optional<uint64_t> NumberToTell(const FanRecord& record);
+  std::optional<uint64_t> NumberToReport(const FanRecord& record);
   /// Nothing is waiting in the kernel.
   void Rest();
   /// Records may have been lost.
