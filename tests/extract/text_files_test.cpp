@@ -1,12 +1,11 @@
-// What the readers get out of text: encodings, markup, and input that means no good.
+// What the readers get out of text: guesses, markup, and input that means no good. Texts in the usual encodings are
+// among the samples (samples_test.cpp).
 
 #include "services/kovacontentextractd/readers/text_files.h"
 
 #include <fcntl.h>
-#include <iconv.h>
 #include <sys/stat.h>
 
-#include <stdexcept>
 #include <string>
 
 #include <gtest/gtest.h>
@@ -54,72 +53,9 @@ class TextFilesTest : public testing::Test {
   TempDir dir_;
 };
 
-string Encode(const string& utf8, const char* encoding) {
-  const iconv_t converter = iconv_open(encoding, "UTF-8");
-  if (converter == reinterpret_cast<iconv_t>(-1)) throw std::runtime_error(encoding);
-  string out(utf8.size() * 4 + 16, '\0');
-  char* from = const_cast<char*>(utf8.data());
-  char* to = out.data();
-  size_t left = utf8.size(), room = out.size();
-  const bool done = iconv(converter, &from, &left, &to, &room) == 0;
-  (void)iconv_close(converter);
-  if (!done) throw std::runtime_error("cannot encode for "s + encoding);
-  out.resize(out.size() - room);
-  return out;
-}
-
 const char kRussian[] =
     "В начале июля, в чрезвычайно жаркое время, под вечер, один молодой человек вышел из своей каморки, которую "
     "нанимал от жильцов в переулке, на улицу и медленно, как бы в нерешимости, отправился к мосту.\n";
-const char kJapanese[] =
-    "吾輩は猫である。名前はまだ無い。どこで生れたかとんと見当がつかぬ。何でも薄暗いじめじめした所で"
-    "ニャーニャー泣いていた事だけは記憶している。\n";
-const char kChinese[] =
-    "学而时习之，不亦说乎？有朋自远方来，不亦乐乎？人不知而不愠，不亦君子乎？这是一个用来测试编码的文件，"
-    "里面有一些常见的汉字。\n";
-const char kKorean[] = "나라의 말이 중국과 달라 문자와 서로 통하지 아니하므로 이런 까닭으로 어리석은 백성이 많다.\n";
-const char kFrench[] =
-    "Le cœur a ses raisons que la raison ne connaît point. Après l'été, les élèves rentrèrent à l'école, "
-    "où ils étudièrent le français, déçus d'être déjà là.\n";
-const char kCzech[] = "Příliš žluťoučký kůň úpěl ďábelské ódy. Malý princ bydlel na planetě.\n";
-const char kUkrainian[] = "Привіт, світе. Це коротке речення українською мовою, щоб перевірити кодування.\n";
-const char kGerman[] =
-    "Die Straße führte über Brücken und durch Wälder; schöne Häuser säumten die Gärten, und größere Türme überragten "
-    "die Dächer.\n";
-
-TEST_F(TextFilesTest, TextOfEveryUsualEncodingComesOutAsUtf8) {
-  const struct {
-    const char* encoding;
-    const char* text;
-    const char* mark;
-  } rows[] = {
-      {"UTF-8", kRussian, ""},
-      {"UTF-8", kJapanese, "\xEF\xBB\xBF"},
-      {"UTF-16LE", kRussian, ""},
-      {"UTF-16BE", kFrench, ""},
-      {"UTF-16LE", kJapanese, "\xFF\xFE"},
-      {"UTF-16BE", kChinese, "\xFE\xFF"},
-      {"WINDOWS-1251", kRussian, ""},
-      {"KOI8-R", kRussian, ""},
-      {"SHIFT_JIS", kJapanese, ""},
-      {"EUC-JP", kJapanese, ""},
-      {"ISO-2022-JP", kJapanese, ""},
-      {"GBK", kChinese, ""},
-      {"EUC-KR", kKorean, ""},
-      {"WINDOWS-1252", kFrench, ""},
-      {"ISO-8859-1", kGerman, ""},
-      {"ISO-8859-15", kGerman, ""},
-      {"WINDOWS-1250", kCzech, ""},
-      {"KOI8-U", kUkrainian, ""},
-  };
-  for (const auto& row : rows) {
-    const Json::Value document = ParseBytes("text.txt", row.mark + Encode(row.text, row.encoding));
-    EXPECT_EQ(row.text, document["KOVAMDTextContent"].asString())
-        << row.encoding << " read as " << document["_KOVATextEncoding"].asString();
-    EXPECT_FALSE(document.isMember("_KOVAExtractError")) << row.encoding;
-  }
-}
-
 TEST_F(TextFilesTest, AShortTextIsAGuessAndSaysSo) {
   EXPECT_EQ("UTF-8", ParseBytes("a.txt", "plain\n")["_KOVATextEncoding"].asString());
   const Json::Value guessed = ParseBytes("b.txt", "caf\xe9\n");
