@@ -155,18 +155,6 @@ class DaemonsTest(InstanceTestCase):
         self.expect_index_is_disk(folder)
         self.assertLess(self.docs()["written"], 4100 - done)
 
-    def test_switched_kind_touches_its_files_alone(self):
-        folder = self.up_with_share(10000)
-        for i in range(10):
-            write(f"{folder}/d{i}/view.jpg", "no real picture")
-        self.ctl("index", "docs", "--wait")
-        written = self.docs()["written"]
-        self.ctl("folder", "set", "/docs", "--kinds", "document,audio,video")
-        self.instance.wait_idle("docs", folder)
-        status = self.docs()
-        self.assertEqual(10, status["written"] - written)
-        self.assertEqual(10060, status["comparison"]["examined"], "all were looked at")
-
     def test_hung_engine_hides_no_share(self):
         self.ctl("up")
         folders = [self.instance.add_share(name) for name in ("a", "b", "c")]
