@@ -4,10 +4,12 @@
 #include <future>
 
 #include "cli/command.h"
+#include "cli/format.h"
 #include "cli/rights.h"
 #include "common/error.h"
 #include "common/file_util.h"
 #include "common/paths.h"
+#include "fileindex/elastic/elastic_control.h"
 #include "wire/frame_client.h"
 
 namespace ferrox::cli {
@@ -187,6 +189,20 @@ Json::Value ShareName(const std::string& name) {
   Json::Value data;
   data["share_name"] = name;
   return data;
+}
+
+Json::Value IndexOf(const std::string& share) {
+  Json::Value data;
+  data["id"] = fileindex::elastic::GetFileIndexID(share);
+  return data;
+}
+
+Json::Value ShareIn(const Json::Value& status, const std::string& share) {
+  if (!status.isObject()) return Json::Value();
+  for (const Json::Value& entry : status["shares"]) {
+    if (TextOf(entry, "share") == share) return entry;
+  }
+  return Json::Value();
 }
 
 void NotifySettingChanged(const std::string& share) {

@@ -52,5 +52,9 @@ void NotifySettingChanged(const std::string& share);
 
 /// {"share_name": name}: the data of the index daemon's commands.
 Json::Value ShareName(const std::string& name);
+/// {"id": ...}: the data of the engine's commands that are about the index of one share.
+Json::Value IndexOf(const std::string& share);
+/// A share's entry in the index daemon's status; null when the daemon has none of it or `status` is null.
+Json::Value ShareIn(const Json::Value& status, const std::string& share);
 
 }  // namespace ferrox::cli

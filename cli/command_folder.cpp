@@ -15,6 +15,7 @@
 #include "cli/folder_path.h"
 #include "cli/format.h"
 #include "cli/kinds.h"
+#include "cli/output.h"
 #include "cli/rights.h"
 #include "common/file_util.h"
 #include "common/paths.h"
@@ -100,13 +101,13 @@ std::string FolderText(const Json::Value& folder) {
 
 /// The library leaves folders of which the state cannot be told out of a page. Here they stay, without it, and standard
 /// error says why. True when there were none.
-bool AddStates(Json::Value& folders, const Json::Value& told) {
+bool AddStates(Json::Value& folders, const Json::Value& with_states) {
   const FolderMgr configured;
   Json::ArrayIndex next = 0;
   for (Json::Value& folder : folders) {
     const std::string path = TextOf(folder, "path");
-    if (next < told.size() && TextOf(told[next], "path") == path) {
-      folder = told[next++];
+    if (next < with_states.size() && TextOf(with_states[next], "path") == path) {
+      folder = with_states[next++];
       continue;
     }
     std::string reason = "try again";  // it could not be told a moment ago
@@ -118,8 +119,7 @@ bool AddStates(Json::Value& folders, const Json::Value& told) {
     } catch (const Error& error) {
       reason = Explain(error);
     }
-    (void)fprintf(stderr, "fileindexctl: %s: its state cannot be told: %s\n", EscapeForTerminal(path).c_str(),
-                  EscapeForTerminal(reason).c_str());
+    Warn(path + ": its state cannot be told: " + reason);
   }
   return next == folders.size();
 }
@@ -166,7 +166,11 @@ int RunFolderReindex(const Arguments& arguments) {
 int RunFolderGet(const Arguments& arguments) {
   Json::Value folder;
   fileindex::FolderGet(folder, ToSharePath(arguments.words[0], FolderMgr()));
-  (void)printf("%s", arguments.Has("--json") ? (ToScriptJson(folder) + "\n").c_str() : FolderText(folder).c_str());
+  if (arguments.Has("--json")) {
+    PrintJson(folder);
+  } else {
+    (void)printf("%s", FolderText(folder).c_str());
+  }
   return kDone;
 }
 
@@ -180,19 +184,19 @@ int RunFolderList(const Arguments& arguments) {
   };
   Json::Value page;
   list(page, Json::Value(Json::arrayValue));
-  bool all_told = true;
+  bool is_complete = true;
   if (arguments.Has("--status")) {
     RequireReadable(InstancePath(kQueueFolder));
-    Json::Value told;
+    Json::Value with_states;
     Json::Value additional(Json::arrayValue);
     additional.append("status");
-    list(told, additional);
-    all_told = AddStates(page["folder"], told["folder"]);
+    list(with_states, additional);
+    is_complete = AddStates(page["folder"], with_states["folder"]);
   }
   const bool none = UintOf(page, "total") == 0;
-  const int done = all_told ? kDone : kIncomplete;
+  const int done = is_complete ? kDone : kIncomplete;
   if (arguments.Has("--json")) {
-    (void)printf("%s\n", ToScriptJson(page).c_str());
+    PrintJson(page);
     return none ? kNothingFound : done;
   }
   for (const Json::Value& folder : page["folder"]) (void)printf("%s", FolderText(folder).c_str());

@@ -41,8 +41,7 @@ struct Share {
 };
 
 Share OpenShare(const std::string& name) {
-  const sdk::SDKShare share(name);
-  RequireIndexed(name, fileindex::FolderMgr());
+  const sdk::SDKShare share(IndexedShare(name));
   return {name, share.GetPath(), share.GetQueuePath()};
 }
 
@@ -56,13 +55,7 @@ void QueueReindex(const Share& share) {
   NotifySettingChanged(share.name);
 }
 
-Json::Value ShareStatusOf(const std::string& name) {
-  const Json::Value status = AskIndexDaemon("status", Json::Value());
-  for (const Json::Value& share : status["shares"]) {
-    if (TextOf(share, "share") == name) return share;
-  }
-  return Json::Value();
-}
+Json::Value ShareStatusOf(const std::string& name) { return ShareIn(AskIndexDaemon("status", Json::Value()), name); }
 
 bool ReindexIsPending(const Share& share, const Json::Value& status) {
   if (status["index"].isObject() && status["index"].isMember("rebuilding")) return true;
@@ -138,10 +131,8 @@ int RunIndex(const Arguments& arguments) {
 int RunRebuild(const Arguments& arguments) {
   const Share share = OpenShare(arguments.words[0]);
   if (ShareStatusOf(share.name).isNull()) ThrowNotWorkedOn(share.name);
-  Json::Value data;
-  data["id"] = fileindex::elastic::GetFileIndexID(share.name);
   try {
-    (void)AskEngine("index_rebuild", data);
+    (void)AskEngine("index_rebuild", IndexOf(share.name));
   } catch (const Refusal& refusal) {
     if (refusal.Code() != Error::kEngineNoSuchIndex) throw;
   }
@@ -166,7 +157,7 @@ int RunSuggestRefresh(const Arguments& arguments) {
     if (left_out.Unless(share, [&] { fileindex::UpdateTermSuggestion({database}); })) ++done;
   }
   (void)printf("suggestions of %s shares are new\n", Count(done).c_str());
-  left_out.Tell();
+  left_out.Warn();
   return left_out.Empty() ? kDone : kIncomplete;
 }
 

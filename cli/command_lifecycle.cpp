@@ -84,15 +84,13 @@ void RefuseActive(const std::string& share) {
 }  // namespace
 
 int RunSharePause(const Arguments& arguments) {
-  const std::string name = sdk::SDKShare(arguments.words[0]).GetName();
-  RequireIndexed(name, FolderMgr());
+  const std::string name = IndexedShare(arguments.words[0]);
   RequireDaemons();
   return ChangeAndReport([&] { fileindex::SharePause(name); }, "share " + name + " was paused already");
 }
 
 int RunShareResume(const Arguments& arguments) {
-  const std::string name = sdk::SDKShare(arguments.words[0]).GetName();
-  RequireIndexed(name, FolderMgr());
+  const std::string name = IndexedShare(arguments.words[0]);
   RequireDaemons();
   const auto resume = [&] {
     try {
@@ -128,8 +126,7 @@ int RunShareForget(const Arguments& arguments) {
 }
 
 int RunShareCheckRecycle(const Arguments& arguments) {
-  const std::string name = sdk::SDKShare(arguments.words[0]).GetName();
-  RequireIndexed(name, FolderMgr());
+  const std::string name = IndexedShare(arguments.words[0]);
   fileindex::ShareCheckRecycle(name);
   (void)printf("the recycle bin of share %s is compared with the index again\n", EscapeForTerminal(name).c_str());
   return kDone;
@@ -149,8 +146,7 @@ int RunUserRename(const Arguments& arguments) {
   const std::string& old_name = arguments.words[0];
   const std::string& new_name = arguments.words[1];
   for (const std::string& name : arguments.words) {
-    if (name.empty() || name.find('/') != std::string::npos || name == "." || name == "..")
-      throw UsageError("\"" + EscapeForTerminal(name) + "\" cannot be a user's name");
+    if (!IsPathName(name)) throw UsageError("\"" + EscapeForTerminal(name) + "\" cannot be a user's name");
   }
   if (old_name == new_name) throw UsageError("the new name is the old one");
   RequireRenamed(old_name, new_name);

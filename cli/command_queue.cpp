@@ -9,6 +9,7 @@
 
 #include "cli/command_table.h"
 #include "cli/escape.h"
+#include "cli/output.h"
 #include "cli/rights.h"
 #include "common/json_util.h"
 #include "fileindex/optree/optree.h"
@@ -43,14 +44,14 @@ void RequireQueue(const std::string& path) {
   if (!beginning.empty()) throw Failure(path + " is no queue file: no line at its beginning is an event" + kRemedy);
 }
 
-void PrintText(const OpPtr& op) {
+void PrintOpAsText(const OpPtr& op) {
   std::ostringstream text;
   text << op;
   (void)printf("%s\n", EscapeForTerminal(text.str()).c_str());
 }
 
 /// The members stand in this order, so that the lines can also be read by eye.
-void PrintJson(const OpPtr& op) {
+void PrintOpAsJson(const OpPtr& op) {
   (void)printf("{\"op\":%d,\"node\":%s,\"path\":%s,\"data\":%s}\n", static_cast<int>(op->op),
                ToScriptJson(op->node->GetPath()).c_str(), ToScriptJson(op->path).c_str(),
                ToScriptJson(op->data).c_str());
@@ -63,8 +64,8 @@ int RunQueueShow(const Arguments& arguments) {
   CheckReadable(path);
   RequireQueue(path);
   fileindex::OPTree tree(path);
-  const int count = tree.ProcessOP(arguments.Has("--json") ? &PrintJson : &PrintText);
-  if (fflush(stdout) != 0) throw Failure("standard output cannot be written");
+  const int count = tree.ProcessOP(arguments.Has("--json") ? &PrintOpAsJson : &PrintOpAsText);
+  FlushOutput();
   (void)fprintf(stderr, "%d\n", count);
   return kDone;
 }

@@ -11,10 +11,12 @@
 #include "cli/explain.h"
 #include "cli/format.h"
 #include "cli/left_out.h"
+#include "cli/output.h"
 #include "fileindex/elastic/elastic_control.h"
 #include "fileindex/folders/folder_mgr.h"
 #include "fileindex/util.h"
 #include "sdk/share.h"
+#include "wire/fields.h"
 
 namespace ferrox::cli {
 
@@ -78,7 +80,7 @@ Json::Value SearchRequest(const Arguments& arguments, const Scope& scope) {
 
 std::string KindOf(const Json::Value& fields, const std::string& path) {
   constexpr const char* kKinds[] = {"document", "audio", "video", "image", "other"};
-  if (fields["KOVAMDIsDir"].isBool() && fields["KOVAMDIsDir"].asBool()) return "folder";
+  if (BoolOf(fields, fileindex::elastic::kKOVAMDIsDir)) return "folder";
   return kKinds[fileindex::GetFileTypeByFullPath(path)];
 }
 
@@ -109,8 +111,9 @@ void PrintHit(const Json::Value& hit, bool on_terminal) {
   (void)printf("%s\n", on_terminal ? ("\033[36m" + shown + "\033[0m").c_str() : shown.c_str());
   const std::string snippet = TextOf(hit, "snippet");
   if (!snippet.empty()) (void)printf("    %s\n", ShowSnippet(snippet, on_terminal).c_str());
-  (void)printf("    %s, %s, %s\n", KindOf(fields, path).c_str(), Size(IntOf(fields, "KOVAMDFSSize")).c_str(),
-               Date(IntOf(fields, "KOVAMDFSContentChangeDate")).c_str());
+  (void)printf("    %s, %s, %s\n", KindOf(fields, path).c_str(),
+               Size(IntOf(fields, fileindex::elastic::kKOVAMDFSSize)).c_str(),
+               Date(IntOf(fields, fileindex::elastic::kKOVAMDFSContentChangeDate)).c_str());
 }
 
 void PrintSummary(const Json::Value& result, uint64_t offset) {
@@ -153,8 +156,8 @@ bool IsFresh(const Arguments& arguments, Scope& scope) try {
   return true;
 } catch (const Failure& failure) {
   const bool goes_on = arguments.Has("--partial");
-  (void)fprintf(stderr, "fileindexctl: %s\n%s\n", EscapeForTerminal(failure.what()).c_str(),
-                goes_on ? "What is shown is what is indexed by now." : kWithoutFresh);
+  Warn(failure.what());
+  (void)fprintf(stderr, "%s\n", goes_on ? "What is shown is what is indexed by now." : kWithoutFresh);
   return goes_on;
 }
 
@@ -191,7 +194,7 @@ int RunSearch(const Arguments& arguments) {
   if (!not_noticed.empty()) result["not_noticed"] = not_noticed;
   const uint64_t hits = result["hits"].isArray() ? result["hits"].size() : 0;
   if (arguments.Has("--json")) {
-    (void)printf("%s\n", ToScriptJson(result).c_str());
+    PrintJson(result);
   } else if (hits > 0) {
     const bool on_terminal = isatty(STDOUT_FILENO) == 1;
     for (const Json::Value& hit : result["hits"]) PrintHit(hit, on_terminal);
@@ -200,8 +203,8 @@ int RunSearch(const Arguments& arguments) {
     PrintNothingFound(result, scope);
   }
   (void)fflush(stdout);
-  if (!not_noticed.empty()) (void)fprintf(stderr, "fileindexctl: %s\n", not_noticed.c_str());
-  scope.left_out.Tell();
+  if (!not_noticed.empty()) Warn(not_noticed);
+  scope.left_out.Warn();
   const bool partial = arguments.Has("--partial");
   if (scope.stale && !partial) (void)fprintf(stderr, "%s\n", kWithoutFresh);
   if (!scope.left_out.Empty() && !partial) return kIncomplete;

@@ -43,21 +43,21 @@ constexpr Service kSupervisor = {"fileindex-supervisor", "supervisor", nullptr, 
   throw Failure(std::string("the ") + service.label + " could not be " + what + (reason.empty() ? "" : ": " + reason));
 }
 
-void TellSupervisor(const char* what) { (void)printf("%s: %s\n", kSupervisor.label, what); }
+void ReportSupervisor(const char* what) { (void)printf("%s: %s\n", kSupervisor.label, what); }
 
 /// systemd does it itself.
 void StartSupervisor() {
   if (kova::host::HasServiceManager()) return;
   const bool ran = kova::host::ChildServicePid(kova::host::kSupervisor) != 0;
   if (kova::host::StartChildService(kova::host::kSupervisor) < 0) ThrowProblem(kSupervisor, "started");
-  TellSupervisor(ran ? "runs already" : "started");
+  ReportSupervisor(ran ? "runs already" : "started");
 }
 
 void StopSupervisor() {
   if (kova::host::HasServiceManager()) return;
   const bool ran = kova::host::ChildServicePid(kova::host::kSupervisor) != 0;
   if (kova::host::StopChildService(kova::host::kSupervisor) < 0) ThrowProblem(kSupervisor, "stopped");
-  if (ran) TellSupervisor("stopped");
+  if (ran) ReportSupervisor("stopped");
 }
 
 /// A daemon that could not be told takes the pause from the status file when it starts.

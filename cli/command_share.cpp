@@ -10,6 +10,7 @@
 #include "cli/configuration_change.h"
 #include "cli/escape.h"
 #include "cli/explain.h"
+#include "cli/output.h"
 #include "cli/own_share.h"
 #include "cli/rights.h"
 #include "cli/share_remains.h"
@@ -119,7 +120,7 @@ void IndexWholeShare(const std::string& name, bool added) {
 }
 
 /// A file is in the deepest share alone.
-void TellOfNested(const kova::host::ShareEntry& added) {
+void PrintNesting(const kova::host::ShareEntry& added) {
   const std::set<std::string> indexed = fileindex::FolderMgr().GetIndexedShares();
   if (indexed.count(added.name) == 0) return;
   for (const auto& share : kova::host::ListShares()) {
@@ -146,7 +147,7 @@ int RunShareAdd(const Arguments& arguments) {
   if (index) IndexWholeShare(entry.name, !known);
   (void)printf("share %s: %s%s%s\n", EscapeForTerminal(entry.name).c_str(), EscapeForTerminal(entry.path).c_str(),
                known ? " (a share already)" : "", index ? ", all of it is indexed" : "");
-  TellOfNested(entry);
+  PrintNesting(entry);
   return kDone;
 }
 
@@ -162,7 +163,7 @@ int RunShareList(const Arguments& arguments) {
       (void)printf("%-20s %s\n", EscapeForTerminal(share.name).c_str(), EscapeForTerminal(share.path).c_str());
     }
   }
-  if (arguments.Has("--json")) (void)printf("%s\n", ToScriptJson(list).c_str());
+  if (arguments.Has("--json")) PrintJson(list);
   if (shares.empty() && !arguments.Has("--json")) {
     (void)fprintf(stderr, "there are no shares; add one with 'fileindexctl share add FOLDER'\n");
   }

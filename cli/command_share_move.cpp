@@ -23,11 +23,13 @@
 #include "fileindex/elastic/elastic_control.h"
 #include "fileindex/folders/folder_mgr.h"
 #include "fileindex/operations/index_mgr.h"
+#include "fileindex/operations/watch_list.h"
 #include "fileindex/queue/event.h"
 #include "fileindex/queue/queue_file.h"
 #include "fileindex/status_mgr.h"
 #include "fileindex/util.h"
 #include "sdk/share.h"
+#include "wire/fields.h"
 
 /// A share gets another name or another folder. The table of shares goes first, since the library asks it where the
 /// share is; each step may be repeated, so that the same command finishes what an earlier run has begun.
@@ -109,10 +111,7 @@ void RenameIndex(const Move& move) {
 }
 
 bool HasWorkerAt(const Json::Value& daemon, const Move& move) {
-  for (const Json::Value& share : daemon["shares"]) {
-    if (TextOf(share, "share") == move.new_name && TextOf(share, "path") == move.new_path) return true;
-  }
-  return false;
+  return TextOf(ShareIn(daemon, move.new_name), "path") == move.new_path;
 }
 
 /// Registers the new place and has the share's worker go on there. A daemon that does not run looks when it starts; one
@@ -141,7 +140,7 @@ void Follow(const Move& move, void (*move_index)(const Move& move), const std::s
   try {
     const bool paused = IsPaused(move.old_name) || IsPaused(move.new_name);
     const std::string old_queue = QueueOf(move.old_path);
-    (void)KOVA::KOVANOTIFYD::MonitorQueue::Delete(old_queue, "fileindex",
+    (void)KOVA::KOVANOTIFYD::MonitorQueue::Delete(old_queue, fileindex::kAppName,
                                                   KOVA::KOVANOTIFYD::MONITOR_QUEUE_TYPE_APPLICATION);
     move_index(move);
     if (!paused) GoOn(move);
@@ -155,9 +154,8 @@ void Follow(const Move& move, void (*move_index)(const Move& move), const std::s
 
 /// Whether the share's index still has documents of its old place.
 bool HasDocumentsBelow(const std::string& share, const std::string& old_path) {
-  Json::Value data;
-  data["id"] = fileindex::elastic::GetFileIndexID(share);
-  data["query"]["qsl"]["prefix"]["KOVAMDPath"] = old_path + "/";
+  Json::Value data = IndexOf(share);
+  data["query"]["qsl"]["prefix"][fileindex::elastic::kKOVAMDPath] = old_path + "/";
   data["query"]["limit"] = 1;
   return HasIndex(share) && !AskEngine("document_get_by_query", data).empty();
 }
@@ -193,7 +191,7 @@ int RunShareRename(const Arguments& arguments) {
   const std::string& from = arguments.words[0];
   const std::string& to = arguments.words[1];
   if (from == to) throw UsageError("the new name is the old one");
-  if (to.empty() || to.find('/') != std::string::npos || to == "." || to == "..") {
+  if (!IsPathName(to)) {
     throw UsageError("\"" + EscapeForTerminal(to) + "\" cannot be a share's name: give the last part of the path");
   }
   RequireEngine();

@@ -11,11 +11,13 @@
 #include "cli/folder_path.h"
 #include "cli/format.h"
 #include "cli/left_out.h"
+#include "cli/output.h"
 #include "common/file_util.h"
 #include "fileindex/elastic/elastic_control.h"
 #include "fileindex/folders/folder_mgr.h"
 #include "fileindex/util.h"
 #include "sdk/share.h"
+#include "wire/fields.h"
 
 namespace ferrox::cli {
 
@@ -30,16 +32,15 @@ constexpr size_t kTextShownBytes = 300;
 constexpr int kPageEntries = 10000;
 
 /// What the path says already, or what is told in words of its own.
-constexpr const char* kToldOtherwise[] = {kPathField,     "KOVAMDParent",         "KOVAMDFSName",
-                                          "KOVAMDKind",   "KOVAMDSearchFileName", "KOVAMDDisplayName",
-                                          "KOVAMDIsDir",  "KOVAMDExtension",      "KOVAMDContentType",
-                                          "KOVAMDFSSize", "KOVAMDLogicalSize",    "KOVAMDContentModificationDate",
-                                          kErrorField,    kVersionField,          "_KOVANeedMeta",
-                                          "_KOVAStamp",   "_KOVATextEncoding",    kCutField};
+constexpr const char* kShownElsewhere[] = {kPathField,     "KOVAMDParent",         "KOVAMDFSName",
+                                           "KOVAMDKind",   "KOVAMDSearchFileName", "KOVAMDDisplayName",
+                                           "KOVAMDIsDir",  "KOVAMDExtension",      "KOVAMDContentType",
+                                           "KOVAMDFSSize", "KOVAMDLogicalSize",    "KOVAMDContentModificationDate",
+                                           kErrorField,    kVersionField,          "_KOVANeedMeta",
+                                           "_KOVAStamp",   "_KOVATextEncoding",    kCutField};
 
 Json::Value Entries(const std::string& share, Json::Value query) {
-  Json::Value data;
-  data["id"] = fileindex::elastic::GetFileIndexID(share);
+  Json::Value data = IndexOf(share);
   data["query"] = std::move(query);
   return AskEngine("document_get_by_query", data);
 }
@@ -75,7 +76,7 @@ void PrintLine(const std::string& name, const std::string& value) {
 
 /// Whether the content was read, by what, and why not.
 std::string Reading(const Json::Value& document) {
-  if (document["KOVAMDIsDir"].isBool() && document["KOVAMDIsDir"].asBool()) return "a folder";
+  if (BoolOf(document, fileindex::elastic::kKOVAMDIsDir)) return "a folder";
   if (!document["_KOVANeedMeta"].isBool()) return "not wanted; 'fileindexctl folder set --kinds' chooses what is read";
   const std::string error = TextOf(document, kErrorField);
   const std::string reader = " (reader version " + std::to_string(IntOf(document, kVersionField)) + ")";
@@ -102,9 +103,9 @@ void PrintDocument(const Json::Value& document, const std::string& text) {
   if (document.isMember("KOVAMDContentType")) PrintLine("type", EscapeOneLine(TextOf(document, "KOVAMDContentType")));
   PrintLine("size", Size(IntOf(document, "KOVAMDFSSize")));
   for (const std::string& field : document.getMemberNames()) {
-    const bool told =
-        std::find(std::begin(kToldOtherwise), std::end(kToldOtherwise), field) != std::end(kToldOtherwise);
-    if (!told) PrintLine(FriendlyName(field), FriendlyValue(field, document[field]));
+    const bool is_shown =
+        std::find(std::begin(kShownElsewhere), std::end(kShownElsewhere), field) != std::end(kShownElsewhere);
+    if (!is_shown) PrintLine(FriendlyName(field), FriendlyValue(field, document[field]));
   }
   PrintText(document, text);
 }
@@ -125,13 +126,10 @@ bool Show(const std::string& file, const Arguments& arguments, LeftOut& left_out
   const Json::Value texts = Entries(share, QueryOf(path, kTextField));
   const std::string text = texts.empty() ? "" : TextOf(texts[0], kTextField);
   if (arguments.Has("--text")) {
-    const std::string shown = isatty(STDOUT_FILENO) == 1 ? EscapeText(text) : text;  // a file gets it as it was read
-    if (fwrite(shown.data(), 1, shown.size(), stdout) != shown.size()) {
-      throw Failure("standard output cannot be written");
-    }
+    PrintBytes(isatty(STDOUT_FILENO) == 1 ? EscapeText(text) : text);  // a file gets it as it was read
   } else if (arguments.Has("--json")) {
     if (!text.empty()) documents[0][kTextField] = text;
-    (void)printf("%s\n", ToScriptJson(documents[0]).c_str());
+    PrintJson(documents[0]);
   } else {
     PrintDocument(documents[0], text);
   }
@@ -149,7 +147,7 @@ void PrintUnread(const Json::Value& document, bool json) {
   line["reason"] = document[kErrorField];
   line["partly_read"] = StringStartWith(TextOf(document, kErrorField), kPartlyRead);
   line["reader_version"] = Json::Int64(IntOf(document, kVersionField));
-  (void)printf("%s\n", ToScriptJson(line).c_str());
+  PrintJson(line);
 }
 
 uint64_t ListUnread(const std::string& share, bool json) {
@@ -178,18 +176,14 @@ Json::Value StatusOfIndexDaemon() try {
 /// Folders of the share that are no part of its index, unless another share has them. Nothing when no daemon tells.
 uint64_t ListLeftOut(const Json::Value& daemon, const std::string& share, bool json) {
   uint64_t count = 0;
-  if (!daemon.isObject()) return count;
-  for (const Json::Value& entry : daemon["shares"]) {
-    if (TextOf(entry, "share") != share) continue;
-    for (const Json::Value& folder : entry["left_out"]) {
-      if (folder.isMember("share")) continue;
-      ++count;
-      if (json) {
-        (void)printf("%s\n", ToScriptJson(folder).c_str());
-      } else {
-        (void)printf("%s\n    left out with all in it: %s\n", EscapeForTerminal(TextOf(folder, "path")).c_str(),
-                     EscapeForTerminal(TextOf(folder, "reason")).c_str());
-      }
+  for (const Json::Value& folder : ShareIn(daemon, share)["left_out"]) {
+    if (folder.isMember("share")) continue;
+    ++count;
+    if (json) {
+      PrintJson(folder);
+    } else {
+      (void)printf("%s\n    left out with all in it: %s\n", EscapeForTerminal(TextOf(folder, "path")).c_str(),
+                   EscapeForTerminal(TextOf(folder, "reason")).c_str());
     }
   }
   return count;
@@ -201,7 +195,7 @@ int RunShow(const Arguments& arguments) {
   bool all = true;
   LeftOut left_out;
   for (const std::string& file : arguments.words) all = Show(file, arguments, left_out) && all;
-  left_out.Tell();
+  left_out.Warn();
   if (!left_out.Empty()) return kIncomplete;
   return all ? kDone : kNothingFound;
 }
@@ -218,10 +212,10 @@ int RunUnread(const Arguments& arguments) {
     });
     folders += ListLeftOut(daemon, share, arguments.Has("--json"));
   }
-  if (fflush(stdout) != 0) throw Failure("standard output cannot be written");
+  FlushOutput();
   (void)fprintf(stderr, "%s files could not be read, or not all of them\n", Count(count).c_str());
   if (folders != 0) (void)fprintf(stderr, "%s folders are left out\n", Count(folders).c_str());
-  left_out.Tell();
+  left_out.Warn();
   return left_out.Empty() ? kDone : kIncomplete;
 }
 

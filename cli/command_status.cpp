@@ -6,10 +6,9 @@
 #include "cli/escape.h"
 #include "cli/explain.h"
 #include "cli/format.h"
-#include "cli/progress.h"
+#include "cli/output.h"
+#include "cli/share_report.h"
 #include "cli/watching.h"
-#include "common/clock.h"
-#include "common/file_util.h"
 #include "fileindex/folders/folder_mgr.h"
 #include "platform/host/child_service.h"
 #include "platform/host/share_table.h"
@@ -17,88 +16,6 @@
 namespace ferrox::cli {
 
 namespace {
-
-void PrintReasons(const char* title, const Json::Value& counts, const Json::Value& examples) {
-  for (const auto& reason : counts.getMemberNames()) {
-    (void)printf("    %s: %s %s\n", title, Count(UintOf(counts, reason.c_str())).c_str(),
-                 EscapeForTerminal(reason).c_str());
-    if (!examples.isObject() || !examples[reason].isArray()) continue;
-    for (const Json::Value& path : examples[reason]) {
-      if (path.isString()) (void)printf("      %s\n", EscapeForTerminal(path.asString()).c_str());
-    }
-  }
-}
-
-/// Files of which a part was read are no failures.
-void PrintExtractErrors(const Json::Value& counts, const Json::Value& examples) {
-  const std::string prefix = kPartlyRead;
-  Json::Value failed(Json::objectValue), partly(Json::objectValue), partly_examples(Json::objectValue);
-  for (const std::string& reason : counts.getMemberNames()) {
-    if (!StringStartWith(reason, prefix)) {
-      failed[reason] = counts[reason];
-      continue;
-    }
-    const std::string missing = reason.substr(prefix.size());
-    partly[missing] = counts[reason];
-    if (examples.isObject()) partly_examples[missing] = examples[reason];
-  }
-  PrintReasons("not read, or not all", failed, examples);
-  PrintReasons("partly read", partly, partly_examples);
-}
-
-std::string FoldersText(uint64_t folders) { return Count(folders) + (folders == 1 ? " folder" : " folders"); }
-
-void PrintWork(const Json::Value& share) {
-  (void)printf("    %s", EscapeForTerminal(Progress::Text(share, 0)).c_str());
-  if (share.isMember("folders")) (void)printf("; %s", FoldersText(UintOf(share, "folders")).c_str());
-  (void)printf("\n    done since the daemon started: %s indexed, %s removed", Count(UintOf(share, "written")).c_str(),
-               Count(UintOf(share, "deleted")).c_str());
-  if (share["rate"].isNumeric() && share["rate"].asDouble() >= 0.5) {
-    (void)printf(", now %s a second", Count(static_cast<uint64_t>(share["rate"].asDouble() + 0.5)).c_str());
-  }
-  if (UintOf(share, "failed") != 0) (void)printf(", %s failed", Count(UintOf(share, "failed")).c_str());
-  (void)printf("\n");
-}
-
-void PrintShare(const Json::Value& share, const std::string& notification_problem) {
-  const std::string name = EscapeForTerminal(TextOf(share, "share"));
-  (void)printf("share %s: %s\n", name.c_str(), EscapeForTerminal(TextOf(share, "path")).c_str());
-  PrintWork(share);
-  (void)fputs(WatchLines(share, notification_problem).c_str(), stdout);
-  const Json::Value& index = share["index"];
-  if (index.isObject() && index.isMember("error")) {
-    (void)printf("    index: cannot be searched: %s\n", EscapeOneLine(TextOf(index["error"], "msg")).c_str());
-  } else if (index.isObject()) {
-    (void)printf("    index: %s documents, %s, %s\n", Count(UintOf(index, "documents")).c_str(),
-                 Size(IntOf(index, "bytes_on_disk")).c_str(),
-                 IntOf(share, "last_commit") == 0 ? "no change since the daemon started"
-                                                  : ("last change " + Date(IntOf(share, "last_commit"))).c_str());
-  }
-  if (index.isObject() && index["rebuilding"].isObject()) {
-    (void)printf("    being rebuilt since %s, because %s; searches find what is indexed by now\n",
-                 Date(IntOf(index["rebuilding"], "since")).c_str(),
-                 EscapeOneLine(TextOf(index["rebuilding"], "reason")).c_str());
-  }
-  const int64_t oldest = IntOf(share, "oldest_change");
-  const int64_t age = oldest == 0 ? 0 : Clock::Get().Now() - oldest;
-  (void)printf("    queued: %s%s\n", Count(UintOf(share, "queued")).c_str(),
-               oldest == 0 ? "" : (", the oldest for " + Duration(static_cast<double>(age))).c_str());
-  if (index.isObject() && index["extract_errors"].isObject()) {
-    PrintExtractErrors(index["extract_errors"], index["extract_error_examples"]);
-    if (!index["extract_errors"].empty()) (void)printf("      all: fileindexctl unread %s\n", name.c_str());
-  }
-  for (const Json::Value& folder : share["left_out"]) {
-    (void)printf("    left out: %s: %s\n", EscapeForTerminal(TextOf(folder, "path")).c_str(),
-                 EscapeForTerminal(TextOf(folder, "reason")).c_str());
-  }
-  Json::Value counts(Json::objectValue);
-  Json::Value examples(Json::objectValue);
-  for (const auto& reason : share["failures"].getMemberNames()) {
-    counts[reason] = share["failures"][reason]["count"];
-    examples[reason] = share["failures"][reason]["examples"];
-  }
-  PrintReasons("not indexed", counts, examples);
-}
 
 std::string PauseText(const Json::Value& status) {
   if (!status["paused"].asBool()) return "";
@@ -195,62 +112,95 @@ void PrintSupervisor() {
   (void)printf("supervisor: %s\n", text.c_str());
 }
 
-/// `needed`: folders are indexed, which takes more than the engine. Content extraction starts by itself.
-int ExitCodeOf(const InstanceState& state, bool needed) {
-  const bool stopped = needed && (state.index_daemon.status.isNull() || state.notification_daemon.status.isNull());
-  if (stopped || state.engine.status.isNull()) return kFailure;
-  for (const DaemonState* daemon :
-       {&state.engine, &state.index_daemon, &state.notification_daemon, &state.content_extraction}) {
+/// Everything that 'status' shows, gathered before any of it is printed.
+struct Report {
+  InstanceState state;
+  Json::Value resting;          ///< shares with indexed folders that no worker has (RestingShares)
+  std::string folders_problem;  ///< why the list of indexed folders cannot be read, "" when it can
+  std::string table_problem;    ///< the same of the table of shares
+  bool has_folders = false;     ///< folders are indexed, which takes more than the engine
+
+  const Json::Value& IndexDaemon() const { return state.index_daemon.status; }
+  const Json::Value& NotificationDaemon() const { return state.notification_daemon.status; }
+};
+
+Report Gather() {
+  Report report;
+  report.state = AskAll();
+  AddWatches(report.NotificationDaemon(), report.state.index_daemon.status);
+  report.resting = RestingShares(report.IndexDaemon(), report.folders_problem);
+  report.table_problem = kova::host::ShareTable::Load(kova::host::ShareTablePath()).Problem();
+  const bool has_workers = !report.IndexDaemon().isNull() && !report.IndexDaemon()["shares"].empty();
+  report.has_folders = has_workers || !report.resting.empty();
+  return report;
+}
+
+/// Content extraction starts by itself when it is needed, so that it may be stopped.
+int ExitCodeOf(const Report& report) {
+  if (!report.folders_problem.empty() || !report.table_problem.empty()) return kFailure;
+  const bool is_stopped = report.has_folders && (report.IndexDaemon().isNull() || report.NotificationDaemon().isNull());
+  if (is_stopped || report.state.engine.status.isNull()) return kFailure;
+  for (const DaemonState* daemon : {&report.state.engine, &report.state.index_daemon, &report.state.notification_daemon,
+                                    &report.state.content_extraction}) {
     if (!daemon->problem.empty()) return kFailure;
   }
   return kDone;
 }
 
+void PrintAsJson(const Report& report) {
+  Json::Value json;
+  json["engine"] = StatusJson(report.state.engine);
+  json["index_daemon"] = StatusJson(report.state.index_daemon);
+  json["notification_daemon"] = StatusJson(report.state.notification_daemon);
+  json["content_extraction"] = StatusJson(report.state.content_extraction);
+  json["supervisor"] = SupervisorJson();
+  json["resting_shares"] = report.resting;
+  const std::string& problem = report.folders_problem.empty() ? report.table_problem : report.folders_problem;
+  if (!problem.empty()) json["problem"] = problem;
+  PrintJson(json);
+}
+
+void PrintDaemons(const Report& report) {
+  // Where the list of folders cannot be read, some may be indexed.
+  const bool needed = report.has_folders || !report.folders_problem.empty();
+  PrintDaemon("search engine", report.state.engine, EngineText(report.state.engine.status));
+  PrintDaemon("index daemon", report.state.index_daemon, DaemonText(report.IndexDaemon(), needed));
+  PrintDaemon("notification daemon", report.state.notification_daemon,
+              NotificationDaemonText(report.NotificationDaemon(), needed));
+  PrintDaemon("content extraction", report.state.content_extraction,
+              ContentExtractionText(report.state.content_extraction.status));
+  PrintSupervisor();
+}
+
+void PrintShares(const Report& report) {
+  if (!report.IndexDaemon().isNull()) {
+    const bool hangs = !report.state.notification_daemon.problem.empty();
+    const char* problem = hangs ? "does not answer" : report.NotificationDaemon().isNull() ? "does not run" : "";
+    for (const Json::Value& share : report.IndexDaemon()["shares"]) PrintShare(share, problem);
+  }
+  for (const Json::Value& share : report.resting) {
+    (void)printf("share %s: %s; %s\n", EscapeForTerminal(TextOf(share, "share")).c_str(),
+                 FoldersText(UintOf(share, "folders")).c_str(),
+                 share["paused"].asBool()                    ? "paused until 'fileindexctl share resume'"
+                 : report.state.index_daemon.problem.empty() ? "nothing works on it now"
+                                                             : "what is done with it is not known");
+  }
+}
+
 }  // namespace
 
 int RunStatus(const Arguments& arguments) {
-  InstanceState state = AskAll();
-  Json::Value& daemon = state.index_daemon.status;
-  const Json::Value& notification_daemon = state.notification_daemon.status;
-  AddWatches(notification_daemon, daemon);
-  std::string problem;
-  const Json::Value resting = RestingShares(daemon, problem);
-  const std::string table_problem = kova::host::ShareTable::Load(kova::host::ShareTablePath()).Problem();
-  const bool has_shares = !daemon.isNull() && !daemon["shares"].empty();
-  const bool needed = has_shares || !resting.empty();
-  const int code = problem.empty() && table_problem.empty() ? ExitCodeOf(state, needed) : kFailure;
+  const Report report = Gather();
   if (arguments.Has("--json")) {
-    Json::Value json;
-    json["engine"] = StatusJson(state.engine);
-    json["index_daemon"] = StatusJson(state.index_daemon);
-    json["notification_daemon"] = StatusJson(state.notification_daemon);
-    json["content_extraction"] = StatusJson(state.content_extraction);
-    json["supervisor"] = SupervisorJson();
-    json["resting_shares"] = resting;
-    if (!problem.empty() || !table_problem.empty()) json["problem"] = problem.empty() ? table_problem : problem;
-    (void)printf("%s\n", ToScriptJson(json).c_str());
-    return code;
+    PrintAsJson(report);
+    return ExitCodeOf(report);
   }
-  PrintDaemon("search engine", state.engine, EngineText(state.engine.status));
-  PrintDaemon("index daemon", state.index_daemon, DaemonText(daemon, needed || !problem.empty()));
-  PrintDaemon("notification daemon", state.notification_daemon,
-              NotificationDaemonText(notification_daemon, needed || !problem.empty()));
-  PrintDaemon("content extraction", state.content_extraction, ContentExtractionText(state.content_extraction.status));
-  PrintSupervisor();
-  if (!problem.empty()) (void)printf("indexed folders: %s\n", EscapeForTerminal(problem).c_str());
-  if (!daemon.isNull()) {
-    const bool hangs = !state.notification_daemon.problem.empty();
-    const char* problem_of_watching = hangs ? "does not answer" : notification_daemon.isNull() ? "does not run" : "";
-    for (const Json::Value& share : daemon["shares"]) PrintShare(share, problem_of_watching);
+  PrintDaemons(report);
+  if (!report.folders_problem.empty()) {
+    (void)printf("indexed folders: %s\n", EscapeForTerminal(report.folders_problem).c_str());
   }
-  for (const Json::Value& share : resting) {
-    (void)printf("share %s: %s; %s\n", EscapeForTerminal(TextOf(share, "share")).c_str(),
-                 FoldersText(UintOf(share, "folders")).c_str(),
-                 share["paused"].asBool()             ? "paused until 'fileindexctl share resume'"
-                 : state.index_daemon.problem.empty() ? "nothing works on it now"
-                                                      : "what is done with it is not known");
-  }
-  return code;
+  PrintShares(report);
+  return ExitCodeOf(report);
 }
 
 }  // namespace ferrox::cli

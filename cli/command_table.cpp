@@ -66,110 +66,121 @@ CommandGroup Searching() {
       }};
 }
 
-CommandGroup Folders() {
+std::vector<Command> FolderCommands() {
   const Option kinds = {"--kinds", "KINDS", "document, audio, video, photo, joined with commas; or all, or none"};
-  return {"What is indexed",
-          {
-              {"folder add",
-               "PATH...",
-               {kinds, kName},
-               "Has folders indexed: all kinds of files, unless told otherwise. All of the folders, or none.",
-               &RunFolderAdd,
-               Needs::kShares},
-              {"folder set",
-               "PATH...",
-               {kinds, kName},
-               "Changes of which kinds of files the content is indexed (--kinds is needed); adds what is missing.",
-               &RunFolderSet,
-               Needs::kShares},
-              {"folder delete",
-               "PATH...",
-               {},
-               "Ends the indexing of folders; the files stay. With the last folder of all, indexing stops.",
-               &RunFolderDelete,
-               Needs::kShares},
-              {"folder reindex",
-               "PATH...",
-               {},
-               "Has folders compared with the index; what differs is indexed.",
-               &RunFolderReindex,
-               Needs::kShares},
-              {"folder get", "PATH", {kJson}, "Shows one indexed folder.", &RunFolderGet, Needs::kAnswers},
-              {"folder list",
-               "",
-               {{"--status", nullptr, "also what each does now"},
-                {"--sort", "path|document|audio|video|photo", "the order (default: as they were added)"},
-                {"--desc", nullptr, "the other way round"},
-                {"--offset", "N", "leave out the first N"},
-                {"--limit", "N", "show at most so many"},
-                kJson},
-               "Lists the indexed folders.",
-               &RunFolderList},
-              {"index",
-               "SHARE",
-               {{"--wait", nullptr, "wait until it is done, and show progress"}},
-               "Has a share compared with its index; what differs is indexed.",
-               &RunIndex,
-               Needs::kShares},
-              {"rebuild",
-               "SHARE",
-               {{"--wait", nullptr, "wait until it is done, and show progress"}},
-               "Makes the index of a share anew and reads all its files. Searches find what is indexed by then.",
-               &RunRebuild,
-               Needs::kShares},
-          }};
+  return {
+      {"folder add",
+       "PATH...",
+       {kinds, kName},
+       "Has folders indexed: all kinds of files, unless told otherwise. All of the folders, or none.",
+       &RunFolderAdd,
+       Needs::kShares},
+      {"folder set",
+       "PATH...",
+       {kinds, kName},
+       "Changes of which kinds of files the content is indexed (--kinds is needed); adds what is missing.",
+       &RunFolderSet,
+       Needs::kShares},
+      {"folder delete",
+       "PATH...",
+       {},
+       "Ends the indexing of folders; the files stay. With the last folder of all, indexing stops.",
+       &RunFolderDelete,
+       Needs::kShares},
+      {"folder reindex",
+       "PATH...",
+       {},
+       "Has folders compared with the index; what differs is indexed.",
+       &RunFolderReindex,
+       Needs::kShares},
+      {"folder get", "PATH", {kJson}, "Shows one indexed folder.", &RunFolderGet, Needs::kAnswers},
+      {"folder list",
+       "",
+       {{"--status", nullptr, "also what each does now"},
+        {"--sort", "path|document|audio|video|photo", "the order (default: as they were added)"},
+        {"--desc", nullptr, "the other way round"},
+        {"--offset", "N", "leave out the first N"},
+        {"--limit", "N", "show at most so many"},
+        kJson},
+       "Lists the indexed folders.",
+       &RunFolderList},
+  };
 }
 
-CommandGroup Shares() {
-  return {"Shares",
-          {
-              {"share add",
-               "FOLDER",
-               {{"--name", "NAME", "the share's name (default: the folder's last component, which it must equal)"},
-                {"--replace", nullptr, "an earlier share of that name, with another folder, makes way"},
-                {"--no-index", nullptr, "do not index it; 'folder add' chooses what is"}},
-               "Makes a folder a share and has all of it indexed.",
-               &RunShareAdd,
-               Needs::kShares},
-              {"share list", "", {kJson}, "Lists the shares: name and folder.", &RunShareList},
-              {"share remove",
-               "SHARE",
-               {},
-               "Ends a share and drops its index; the folder and its files stay.",
-               &RunShareRemove,
-               Needs::kShares},
-              {"share rename",
-               "SHARE NEW_NAME",
-               {},
-               "Renames a share and its folder; its index follows.",
-               &RunShareRename,
-               Needs::kShares},
-              {"share migrate",
-               "SHARE NEW_FOLDER",
-               {{"--from", "FOLDER", "where it was, of a share of Samba or to finish an interrupted run"}},
-               "Tells that a share's folder has been moved, for example to another volume; its index follows.",
-               &RunShareMigrate,
-               Needs::kShares},
-              {"share pause", "SHARE", {}, "Stops the indexing of a share.", &RunSharePause, Needs::kShares},
-              {"share resume",
-               "SHARE",
-               {},
-               "Goes on with a share; what has changed meanwhile is indexed.",
-               &RunShareResume,
-               Needs::kShares},
-              {"share forget",
-               "SHARE [FOLDER]",
-               {},
-               "Drops the index of a paused share that does not come back; its folder is needed when it is gone.",
-               &RunShareForget,
-               Needs::kShares},
-              {"share check-recycle",
-               "SHARE",
-               {},
-               "Looks at a share's recycle bin again, after it was switched on or off.",
-               &RunShareCheckRecycle,
-               Needs::kShares},
-          }};
+/// Of whole shares.
+std::vector<Command> IndexCommands() {
+  return {
+      {"index",
+       "SHARE",
+       {{"--wait", nullptr, "wait until it is done, and show progress"}},
+       "Has a share compared with its index; what differs is indexed.",
+       &RunIndex,
+       Needs::kShares},
+      {"rebuild",
+       "SHARE",
+       {{"--wait", nullptr, "wait until it is done, and show progress"}},
+       "Makes the index of a share anew and reads all its files. Searches find what is indexed by then.",
+       &RunRebuild,
+       Needs::kShares},
+  };
+}
+
+/// What changes the table of shares.
+std::vector<Command> ShareTableCommands() {
+  return {
+      {"share add",
+       "FOLDER",
+       {{"--name", "NAME", "the share's name (default: the folder's last component, which it must equal)"},
+        {"--replace", nullptr, "an earlier share of that name, with another folder, makes way"},
+        {"--no-index", nullptr, "do not index it; 'folder add' chooses what is"}},
+       "Makes a folder a share and has all of it indexed.",
+       &RunShareAdd,
+       Needs::kShares},
+      {"share list", "", {kJson}, "Lists the shares: name and folder.", &RunShareList},
+      {"share remove",
+       "SHARE",
+       {},
+       "Ends a share and drops its index; the folder and its files stay.",
+       &RunShareRemove,
+       Needs::kShares},
+      {"share rename",
+       "SHARE NEW_NAME",
+       {},
+       "Renames a share and its folder; its index follows.",
+       &RunShareRename,
+       Needs::kShares},
+      {"share migrate",
+       "SHARE NEW_FOLDER",
+       {{"--from", "FOLDER", "where it was, of a share of Samba or to finish an interrupted run"}},
+       "Tells that a share's folder has been moved, for example to another volume; its index follows.",
+       &RunShareMigrate,
+       Needs::kShares},
+  };
+}
+
+/// What changes how a share is indexed, and leaves it where it is.
+std::vector<Command> ShareStateCommands() {
+  return {
+      {"share pause", "SHARE", {}, "Stops the indexing of a share.", &RunSharePause, Needs::kShares},
+      {"share resume",
+       "SHARE",
+       {},
+       "Goes on with a share; what has changed meanwhile is indexed.",
+       &RunShareResume,
+       Needs::kShares},
+      {"share forget",
+       "SHARE [FOLDER]",
+       {},
+       "Drops the index of a paused share that does not come back; its folder is needed when it is gone.",
+       &RunShareForget,
+       Needs::kShares},
+      {"share check-recycle",
+       "SHARE",
+       {},
+       "Looks at a share's recycle bin again, after it was switched on or off.",
+       &RunShareCheckRecycle,
+       Needs::kShares},
+  };
 }
 
 CommandGroup HostEvents() {
@@ -234,11 +245,20 @@ CommandGroup Inspection() {
           }};
 }
 
+std::vector<Command> Joined(std::vector<Command> first, const std::vector<Command>& second) {
+  (void)first.insert(first.end(), second.begin(), second.end());
+  return first;
+}
+
 }  // namespace
 
 const std::vector<CommandGroup>& CommandTable() {
-  static const std::vector<CommandGroup> table = {Services(), Searching(),  Folders(),
-                                                  Shares(),   HostEvents(), Inspection()};
+  static const std::vector<CommandGroup> table = {Services(),
+                                                  Searching(),
+                                                  {"What is indexed", Joined(FolderCommands(), IndexCommands())},
+                                                  {"Shares", Joined(ShareTableCommands(), ShareStateCommands())},
+                                                  HostEvents(),
+                                                  Inspection()};
   return table;
 }
 

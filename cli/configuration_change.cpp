@@ -78,6 +78,12 @@ void RequireIndexed(const std::string& share, const fileindex::FolderMgr& config
                 "' adds all of it");
 }
 
+std::string IndexedShare(const std::string& name) {
+  std::string known = sdk::SDKShare(name).GetName();
+  RequireIndexed(known, fileindex::FolderMgr());
+  return known;
+}
+
 std::vector<std::string> IndexedShares(const std::vector<std::string>& names) {
   const fileindex::FolderMgr configured;
   for (const std::string& name : names) RequireIndexed(sdk::SDKShare(name).GetName(), configured);

@@ -28,6 +28,9 @@ bool MarkIfBusy(const std::string& share);
 /// @throws Failure when no folder of the share is indexed.
 void RequireIndexed(const std::string& share, const fileindex::FolderMgr& configured);
 
+/// The name of a share that is there. @throws Error kNoSuchShare; Failure when no folder of it is indexed.
+std::string IndexedShare(const std::string& name);
+
 /// The shares of these names; without names, all that have an indexed folder.
 /// @throws Failure when no folder of one is indexed; Error kNoSuchShare.
 std::vector<std::string> IndexedShares(const std::vector<std::string>& names);

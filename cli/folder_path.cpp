@@ -4,6 +4,7 @@
 #include <unistd.h>
 
 #include <cerrno>
+#include <climits>
 #include <vector>
 
 #include "base/path.h"
@@ -19,15 +20,6 @@
 namespace ferrox::cli {
 
 namespace {
-
-std::string FromWorkingFolder(const std::string& text) {
-  if (text[0] == '/') return text;
-  char folder[4096];
-  if (getcwd(folder, sizeof(folder)) == nullptr) {
-    throw Failure("the working folder cannot be told; give a path that begins with /");
-  }
-  return std::string(folder) + "/" + text;
-}
 
 /// The share path of a path on disk, "" when no share holds it. Asking the library would log a failure.
 std::string SharePathOnDisk(const std::string& path) {
@@ -73,6 +65,19 @@ bool Exists(const std::string& path) {
   return false;
 }
 
+bool IsPathName(const std::string& text) {
+  return !text.empty() && text.find('/') == std::string::npos && text != "." && text != "..";
+}
+
+std::string FromWorkingFolder(const std::string& text, const char* what) {
+  if (!text.empty() && text[0] == '/') return text;
+  char folder[PATH_MAX];
+  if (getcwd(folder, sizeof(folder)) == nullptr) {
+    throw Failure(std::string("the working folder cannot be told; give ") + what);
+  }
+  return std::string(folder) + "/" + text;
+}
+
 std::string CleanPath(const std::string& absolute, bool parents) {
   std::vector<std::string> kept;
   for (const std::string& part : Split(absolute, '/')) {
@@ -88,7 +93,9 @@ std::string CleanPath(const std::string& absolute, bool parents) {
   return path.empty() ? "/" : path;
 }
 
-std::string AbsolutePath(const std::string& text) { return CleanPath(FromWorkingFolder(text), true); }
+std::string AbsolutePath(const std::string& text) {
+  return CleanPath(FromWorkingFolder(text, "a path that begins with /"), true);
+}
 
 std::string ToSharePath(const std::string& text, const fileindex::FolderMgr& configured) {
   if (text.empty()) throw UsageError("an empty path is no folder");

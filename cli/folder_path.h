@@ -17,6 +17,13 @@ bool Exists(const std::string& path);
 /// @throws Failure for a path on disk that no share holds.
 std::string ToSharePath(const std::string& text, const fileindex::FolderMgr& configured);
 
+/// Whether a text can be one name in a path: the name of a share, a user, a folder.
+bool IsPathName(const std::string& text);
+
+/// A path that begins with "/" itself, another one behind the working folder. Nothing is cleaned or looked up.
+/// @throws Failure "the working folder cannot be told; give <what>".
+std::string FromWorkingFolder(const std::string& text, const char* what);
+
 /// An absolute path without needless "/" and ".", and without ".." when `parents` is set; nothing is looked up.
 std::string CleanPath(const std::string& absolute, bool parents);
 /// The same for a path that may begin in the working folder, ".." resolved.

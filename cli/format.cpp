@@ -62,6 +62,11 @@ int64_t IntOf(const Json::Value& object, const char* key) {
   return member.isInt64() ? member.asInt64() : 0;
 }
 
+bool BoolOf(const Json::Value& object, const char* key) {
+  const Json::Value& member = MemberOf(object, key);
+  return member.isBool() && member.asBool();
+}
+
 std::string TextOf(const Json::Value& object, const char* key) {
   const Json::Value& member = MemberOf(object, key);
   return member.isString() ? member.asString() : "";

@@ -20,9 +20,10 @@ std::string Duration(double seconds);
 /// How the reason begins that an indexed file has which was read, but not all of it.
 inline constexpr char kPartlyRead[] = "partly read: ";
 
-/// Members of a reply, 0 or "" when they are missing or of another type.
+/// Members of a reply, 0, "" or false when they are missing or of another type.
 uint64_t UintOf(const Json::Value& object, const char* key);
 int64_t IntOf(const Json::Value& object, const char* key);
 std::string TextOf(const Json::Value& object, const char* key);
+bool BoolOf(const Json::Value& object, const char* key);
 
 }  // namespace ferrox::cli

@@ -1,24 +1,17 @@
 #include "cli/global_options.h"
 
-#include <unistd.h>
-
 #include <cstdlib>
 
 #include "cli/command.h"
+#include "cli/folder_path.h"
 
 namespace ferrox::cli {
 
 namespace {
 
 void UseRoot(const std::string& root) {
-  std::string absolute = root;
   if (root.empty()) throw UsageError("--root needs a folder");
-  if (root[0] != '/') {
-    char folder[4096];
-    if (getcwd(folder, sizeof(folder)) == nullptr)
-      throw Failure("the working folder cannot be told; give --root a path that begins with /");
-    absolute = std::string(folder) + "/" + root;
-  }
+  const std::string absolute = FromWorkingFolder(root, "--root a path that begins with /");
   (void)setenv("FERROX_ROOT", absolute.c_str(), 1);
 }
 

@@ -3,6 +3,7 @@
 #include <algorithm>
 
 #include "cli/command.h"
+#include "cli/format.h"
 
 namespace ferrox::cli {
 
@@ -19,7 +20,7 @@ Kinds::Kinds(const std::string& text) {
 }
 
 Kinds::Kinds(const Json::Value& folder) {
-  for (size_t i = 0; i < kKinds.size(); ++i) chosen_[i] = folder[kKinds[i]].isBool() && folder[kKinds[i]].asBool();
+  for (size_t i = 0; i < kKinds.size(); ++i) chosen_[i] = BoolOf(folder, kKinds[i]);
 }
 
 void Kinds::Store(Json::Value& folder) const {

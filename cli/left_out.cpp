@@ -7,6 +7,7 @@
 #include "cli/command.h"
 #include "cli/escape.h"
 #include "cli/format.h"
+#include "cli/output.h"
 #include "common/error.h"
 #include "common/file_util.h"
 #include "fileindex/elastic/elastic_control.h"
@@ -64,9 +65,7 @@ void LeftOut::AddFrom(const Json::Value& reply) {
 }
 
 bool LeftOut::AddIfRebuilding(const std::string& share) {
-  Json::Value data;
-  data["id"] = GetFileIndexID(share);
-  const Json::Value rebuilding = AskEngine("index_stat", data)["rebuilding"];
+  const Json::Value rebuilding = AskEngine("index_stat", IndexOf(share))["rebuilding"];
   if (!rebuilding.isObject()) return false;
   Add(share, 0, "its index is being rebuilt, because " + TextOf(rebuilding, "reason"), true);
   return true;
@@ -93,13 +92,11 @@ bool LeftOut::Unless(const std::string& share, const std::function<void()>& run)
   }
 }
 
-void LeftOut::Tell() const {
+void LeftOut::Warn() const {
   for (const Json::Value& entry : list_) {
     const std::string share = TextOf(entry, "share");
-    (void)fprintf(stderr, "fileindexctl: %s: %s%s\n",
-                  entry["searched"].asBool() ? "only what is indexed by now" : "left out",
-                  share.empty() ? "" : ("share " + EscapeForTerminal(share) + ": ").c_str(),
-                  EscapeOneLine(TextOf(entry, "reason")).c_str());
+    const std::string what = entry["searched"].asBool() ? "only what is indexed by now: " : "left out: ";
+    cli::Warn(what + (share.empty() ? "" : "share " + share + ": ") + EscapeOneLine(TextOf(entry, "reason")));
   }
 }
 

@@ -27,8 +27,8 @@ class LeftOut {
   bool Empty() const { return list_.empty(); }
   /// An array of {"share", "id", "code", "reason", "searched"}, for scripts.
   const Json::Value& ToJson() const { return list_; }
-  /// A line for each on standard error.
-  void Tell() const;
+  /// Prints a line for each on standard error.
+  void Warn() const;
 
  private:
   Json::Value list_{Json::arrayValue};

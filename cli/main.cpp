@@ -7,6 +7,7 @@
 #include "cli/escape.h"
 #include "cli/explain.h"
 #include "cli/global_options.h"
+#include "cli/output.h"
 #include "cli/rights.h"
 #include "common/error.h"
 #include "common/paths.h"
@@ -98,19 +99,19 @@ int main(int argc, char** argv) {
   (void)setlocale(LC_CTYPE, "");
   try {
     const int code = Run({argv + 1, argv + argc});
-    if (fflush(stdout) != 0) throw Failure("standard output cannot be written");
+    FlushOutput();
     return code;
   } catch (const UsageError& error) {
     (void)fprintf(stderr, "fileindexctl: %s\nTry 'fileindexctl --help'.\n", EscapeText(error.what()).c_str());
     return kWrongUsage;
   } catch (const NotPermitted& error) {
-    (void)fprintf(stderr, "fileindexctl: %s\n", EscapeForTerminal(error.what()).c_str());
+    Warn(error.what());
     return kNotPermitted;
   } catch (const ferrox::Error& error) {
-    (void)fprintf(stderr, "fileindexctl: %s\n", EscapeForTerminal(Explain(error)).c_str());
+    Warn(Explain(error));
     if (error.Code() == ferrox::Error::kCredentialsFailed) return kNotPermitted;
   } catch (const std::exception& error) {
-    (void)fprintf(stderr, "fileindexctl: %s\n", EscapeForTerminal(error.what()).c_str());
+    Warn(error.what());
   }
   return kFailure;
 }

@@ -32,7 +32,7 @@ std::string Progress::Text(const Json::Value& share, size_t bar_width) {
   const std::string state = TextOf(share, "state");
   if (state != "indexing") return state + (TextOf(share, "detail").empty() ? "" : ": " + TextOf(share, "detail"));
   const Json::Value& comparison = share["comparison"];
-  if (!comparison["running"].isBool() || !comparison["running"].asBool()) {
+  if (!BoolOf(comparison, "running")) {
     return Count(UintOf(share, "operations_done")) + " of " + Count(UintOf(share, "operations")) + " changes";
   }
   const uint64_t examined = UintOf(comparison, "examined");

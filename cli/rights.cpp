@@ -11,7 +11,7 @@
 
 #include <kova/instance.h>
 
-#include "cli/escape.h"
+#include "cli/output.h"
 #include "common/file_util.h"
 #include "common/paths.h"
 #include "platform/host/share_table.h"
@@ -73,7 +73,7 @@ void RequireShareTable(Needs needs) {
   const std::string problem = kova::host::ShareTable::Load(kova::host::ShareTablePath()).Problem();
   if (problem.empty()) return;
   if (needs == Needs::kAnswers || needs == Needs::kShares) throw Failure(problem);
-  (void)fprintf(stderr, "fileindexctl: %s\n", EscapeForTerminal(problem).c_str());
+  Warn(problem);
 }
 
 void RequireRights(Needs needs) {

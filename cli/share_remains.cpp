@@ -6,6 +6,7 @@
 #include "common/error.h"
 #include "common/log.h"
 #include "fileindex/elastic/elastic_control.h"
+#include "fileindex/operations/watch_list.h"
 #include "fileindex/queue/queue_file.h"
 
 namespace ferrox::cli {
@@ -28,7 +29,7 @@ bool HasIndex(const std::string& share) {
 
 void Unregister(const std::string& queue_path) {
   using namespace KOVA::KOVANOTIFYD;
-  const bool done = MonitorQueue::Delete(queue_path, "fileindex", MONITOR_QUEUE_TYPE_APPLICATION);
+  const bool done = MonitorQueue::Delete(queue_path, fileindex::kAppName, MONITOR_QUEUE_TYPE_APPLICATION);
   FERROX_FAIL_IF(!done, Error::kInternal, "the watch list of " + queue_path + " cannot be taken back");
 }
 

@@ -5,26 +5,25 @@
 #include "cli/escape.h"
 #include "cli/format.h"
 #include "common/clock.h"
+#include "fileindex/operations/watch_list.h"
 
 namespace ferrox::cli {
 
 namespace {
 
-constexpr char kApplication[] = "fileindex";
-
 Json::Value WatchOf(const Json::Value& notification_daemon, const std::string& queue) {
   if (queue.empty() || !notification_daemon.isObject()) return Json::Value();
   for (const Json::Value& entry : notification_daemon["queues"]) {
-    if (TextOf(entry, "queue") == queue && TextOf(entry, "application") == kApplication) return entry;
+    if (TextOf(entry, "queue") == queue && TextOf(entry, "application") == fileindex::kAppName) return entry;
   }
   return Json::Value();
 }
 
 /// "by inotify (fanotify needs the capability CAP_SYS_ADMIN), not yet everywhere"
-std::string Way(const Json::Value& folder) {
+std::string HowNoticed(const Json::Value& folder) {
   const std::string watch = TextOf(folder, "watch");
   const std::string reason = TextOf(folder, "reason");
-  const bool covered = folder["covered"].isBool() && folder["covered"].asBool();
+  const bool covered = BoolOf(folder, "covered");
   return (watch.empty() ? "are not noticed" : "by " + watch) + (reason.empty() ? "" : " (" + reason + ")") +
          (covered || watch.empty() ? "" : ", not yet everywhere");
 }
@@ -57,13 +56,13 @@ std::string WatchLines(const Json::Value& share, const std::string& daemon_probl
     return std::string(kNotNoticed) + ": nobody asked for it; 'fileindexctl folder set' does so again\n";
   }
   std::set<std::string> ways;
-  for (const Json::Value& folder : watch["watches"]) ways.insert(Way(folder));
+  for (const Json::Value& folder : watch["watches"]) ways.insert(HowNoticed(folder));
   std::string lines;
   if (ways.size() == 1) lines = "    changes " + EscapeForTerminal(*ways.begin()) + "\n";
   for (const Json::Value& folder : watch["watches"]) {
     if (ways.size() == 1) break;
-    lines +=
-        "    changes in " + EscapeForTerminal(TextOf(folder, "path")) + " " + EscapeForTerminal(Way(folder)) + "\n";
+    lines += "    changes in " + EscapeForTerminal(TextOf(folder, "path")) + " " +
+             EscapeForTerminal(HowNoticed(folder)) + "\n";
   }
   return lines + HeldLine(watch);
 }
