@@ -9,10 +9,12 @@ install(TARGETS fileindex platform_host kova_interface EXPORT fileindexTargets
         LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR})
 install(EXPORT fileindexTargets NAMESPACE fileindex:: DESTINATION ${package_folder})
 
-# Of the library's own headers, those that describe what libfileindex.so shows; the others are its own business.
-install(DIRECTORY ${CMAKE_SOURCE_DIR}/base ${CMAKE_SOURCE_DIR}/common ${CMAKE_SOURCE_DIR}/sdk DESTINATION ${header_folder}
+# Of the library's own headers, those that describe what libfileindex.so shows, and of base's, which it does not show,
+# those that have no source; the others are its own business.
+install(DIRECTORY ${CMAKE_SOURCE_DIR}/common ${CMAKE_SOURCE_DIR}/sdk DESTINATION ${header_folder}
         FILES_MATCHING PATTERN "*.h")
-foreach(header fileindex/folder fileindex/folder_mgr fileindex/index_mgr fileindex/optree fileindex/queue_mgr fileindex/status_mgr fileindex/util
+foreach(header base/mutex base/path base/path_table base/scope_exit base/thread_annotations base/unique_fd
+        fileindex/folder fileindex/folder_mgr fileindex/index_mgr fileindex/optree fileindex/queue_mgr fileindex/status_mgr fileindex/util
         fileindex/watch_list fileindex/folders/folder fileindex/folders/folder_mgr fileindex/operations/index_mgr
         fileindex/operations/operation_error
         fileindex/operations/watch_list fileindex/optree/optree fileindex/queue/event fileindex/queue/queue_mgr fileindex/elastic/comm

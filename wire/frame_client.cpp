@@ -4,9 +4,9 @@
 
 #include <kova/sock_connection.h>
 
+#include "base/frames.h"
 #include "common/json_util.h"
 #include "common/paths.h"
-#include "platform/shared/frames.h"
 
 namespace ferrox::wire {
 
@@ -64,20 +64,20 @@ Reply Ask(const char* socket, const std::string& request, std::chrono::milliseco
 }  // namespace
 
 Outcome FrameClient::Connect() {
-  socket_ = base::UniqueFd(kova::ConnectUnixSocket(socket_path_));
+  socket_ = base::ConnectUnixSocket(socket_path_);
   return socket_.Valid() ? Outcome::kAnswered : WhyNotConnected(errno);
 }
 
 Outcome FrameClient::Send(const std::string& message) {
   const kovadaemon::SocketWait wait(socket_.Get());
-  if (kova::SendFrame(socket_.Get(), message, kMessageMaxBytes, kSendIdleMs)) return Outcome::kAnswered;
+  if (base::SendFrame(socket_.Get(), message, kMessageMaxBytes, kSendIdleMs)) return Outcome::kAnswered;
   return WhyCutShort(errno);
 }
 
 Outcome FrameClient::Receive(std::string& message, std::chrono::milliseconds longest) {
   const kovadaemon::SocketWait wait(socket_.Get());
   const auto longest_ms = static_cast<int>(longest.count());
-  if (kova::RecvFrame(socket_.Get(), message, kMessageMaxBytes, longest_ms)) return Outcome::kAnswered;
+  if (base::RecvFrame(socket_.Get(), message, kMessageMaxBytes, longest_ms)) return Outcome::kAnswered;
   return WhyCutShort(errno);
 }
 

@@ -40,8 +40,6 @@ EXCEPTIONS = {
     "services/fileindexd/main.cpp": ["platform/host/share_table.h", "platform/host/mounts.h"],
     "services/kovanotifyd/main.cpp": ["platform/host/configuration.h", "platform/host/notify_registry.h"],
     "services/supervisor/main.cpp": ["platform/host/service_log.h", "platform/host/child_service.h"],
-    # Frames are every implementation's of the platform, and the client's.
-    "wire/frame_client.cpp": ["platform/shared/frames.h"],
 }
 # The tool keeps the table of shares, tells what is wrong in it or why a service did not start, and knows mount points.
 TOOL_MAY = {f"platform/host/{name}.h" for name in ("share_table", "share_rules", "mounts", "child_service")}
