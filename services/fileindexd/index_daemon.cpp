@@ -86,7 +86,7 @@ IndexDaemon::IndexDaemon(const Options& options)
     : pool_(ThreadsFor(options.workers)),
       workers_([this, is_mount_point = options.is_mount_point,
                 mounts_below = options.mounts_below](const std::string& share) {
-        ShareWorker::Environment environment{pool_, pause_};
+        WorkerEnvironment environment{pool_, pause_};
         environment.is_mount_point = is_mount_point;
         environment.mounts_below = mounts_below;
         return std::make_unique<ShareWorker>(share, environment);

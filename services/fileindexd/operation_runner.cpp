@@ -61,9 +61,9 @@ OperationRunner::OperationRunner(const PassContext& context)
       tasks_(context.pool, context.interruption),
       gone_trees_(tasks_, writer_, true),
       gone_(tasks_, writer_, false),
-      ahead_before_(context_.written_ahead),
+      early_writes_before_(context_.early_writes),
       follower_({context_.share, context_.root, context_.folders, context_.queue_path, writer_, context_.pool,
-                 context_.interruption, context_.keep_up_interval}) {}
+                 context_.interruption, context_.early_write_interval}) {}
 
 /// What was written ahead is there, however the pass ends.
 OperationRunner::~OperationRunner() { StopFollowing(); }
@@ -88,7 +88,7 @@ void OperationRunner::Run(const std::function<void(const std::function<void(cons
   tasks_.Wait();
   StopFollowing();
   follower_.ThrowIfFailed();
-  LookAtWrittenAhead();
+  RecheckEarlyWrites();
   RefreshChangedFiles();
   RefreshSuspects();
   Commit();
@@ -148,18 +148,18 @@ void OperationRunner::CommitIfDue() {
 
 /// Folding drops the delete of a file where the folder that it was in is a file now, since nothing in that folder could
 /// have been indexed, if it were not for this.
-void OperationRunner::LookAtWrittenAhead() {
+void OperationRunner::RecheckEarlyWrites() {
   struct stat status = {};
-  for (const std::string& path : ahead_before_) {
+  for (const std::string& path : early_writes_before_) {
     if (LookAt(path, status) == Presence::kGone) gone_.Add(path);
   }
   gone_.Flush();
-  context_.written_ahead = follower_.EarlyWrites();
+  context_.early_writes = follower_.EarlyWrites();
 }
 
 void OperationRunner::StopFollowing() {
   follower_.Stop();
-  context_.written_ahead.insert(follower_.EarlyWrites().begin(), follower_.EarlyWrites().end());
+  context_.early_writes.insert(follower_.EarlyWrites().begin(), follower_.EarlyWrites().end());
 }
 
 void OperationRunner::Commit() {

@@ -38,7 +38,7 @@ struct PassContext {
   ShareStatus& status;
   const HeldFolder& held;  ///< the share's folder
   const std::string& queue_path;
-  std::chrono::milliseconds keep_up_interval;
+  std::chrono::milliseconds early_write_interval;
   /// Numbers of files that changed under names that tell nothing of the share's own.
   const std::set<uint64_t>& changed_files;
   /// Whether the index may hold documents of an earlier place of the share.
@@ -49,7 +49,7 @@ struct PassContext {
   /// they have changed, so that the pass begins anew.
   std::function<void()> await_folders;
   /// Files that a pass wrote ahead of the pass that has their lines, which looks at them again. Kept by the worker.
-  std::set<std::string>& written_ahead;
+  std::set<std::string>& early_writes;
 };
 
 /// Carries the operations of one pass into the index, in two stages: first what removes and moves documents, in the
@@ -105,7 +105,7 @@ class OperationRunner {
   void FinishMoves();
   void CommitIfDue();
   void StopFollowing();
-  void LookAtWrittenAhead();
+  void RecheckEarlyWrites();
   void Commit();
 
   bool BecameReadable(const std::string& folder);
@@ -130,7 +130,7 @@ class OperationRunner {
   PathsUnderWay under_way_;
   RemovalBatch gone_trees_;
   RemovalBatch gone_;
-  const std::set<std::string> ahead_before_;  ///< written ahead of this pass
+  const std::set<std::string> early_writes_before_;  ///< written ahead of this pass
   base::PathTable<bool> compared_;
   bool had_reindex_ = false;
   std::chrono::steady_clock::time_point last_commit_ = std::chrono::steady_clock::now();

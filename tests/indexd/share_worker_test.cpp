@@ -73,7 +73,7 @@ TEST_F(ShareWorkerTest, CopiedTreeIsComparedOnce) {
 }
 
 TEST_F(ShareWorkerTest, FilesThatChangeBesideSlowOnesAreWrittenSoon) {
-  keep_up_interval = std::chrono::milliseconds(0);
+  early_write_interval = std::chrono::milliseconds(0);
   worker = MakeWorker();
   for (int i = 0; i < 300; ++i) test::WriteFile(At("f" + std::to_string(i)), "x");
   SlowFiles slow(*index, {At("aa"), At("f5")});
@@ -115,7 +115,7 @@ TEST_F(ShareWorkerTest, FileThatIsWrittenWhileItsAttributesAreReadKeepsNoOldText
 }
 
 TEST_F(ShareWorkerTest, FileWrittenAheadDoesNotOutliveItsFolder) {
-  keep_up_interval = std::chrono::milliseconds(0);
+  early_write_interval = std::chrono::milliseconds(0);
   worker = MakeWorker();
   for (int i = 0; i < 300; ++i) test::WriteFile(At("f" + std::to_string(i)), "x");
   SlowFiles slow(*index, {At("b/x")});

@@ -29,7 +29,7 @@ class WorkerSetTest : public testing::Test {
 
   std::unique_ptr<ShareWorker> Make(const std::string& share) {
     ++made_;
-    ShareWorker::Environment environment{pool_, pause_};
+    WorkerEnvironment environment{pool_, pause_};
     if (!asks_engine_) environment.open_index = [](const std::string&) { return std::make_unique<FakeIndex>(); };
     return std::make_unique<ShareWorker>(share, environment);
   }

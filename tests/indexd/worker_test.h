@@ -73,15 +73,15 @@ class WorkerTest : public testing::Test {
   }
 
   std::unique_ptr<ShareWorker> MakeWorker() {
-    ShareWorker::Environment environment{pool, pause, [this](const std::string&) {
-                                           auto fake = std::make_unique<FakeIndex>();
-                                           fake->documents = kept;
-                                           index = fake.get();
-                                           return fake;
-                                         }};
+    WorkerEnvironment environment{pool, pause, [this](const std::string&) {
+                                    auto fake = std::make_unique<FakeIndex>();
+                                    fake->documents = kept;
+                                    index = fake.get();
+                                    return fake;
+                                  }};
     environment.gather_time = std::chrono::milliseconds(0);
     environment.patience = patience;
-    environment.keep_up_interval = keep_up_interval;
+    environment.early_write_interval = early_write_interval;
     environment.is_mount_point = is_mount_point;
     environment.volume_poll = std::chrono::milliseconds(20);
     return std::make_unique<ShareWorker>(share, environment);
@@ -148,7 +148,7 @@ class WorkerTest : public testing::Test {
   TaskPool pool{2};
   PauseState pause;
   std::chrono::milliseconds patience{0};
-  std::chrono::milliseconds keep_up_interval{3600 * 1000};
+  std::chrono::milliseconds early_write_interval{3600 * 1000};
   IsMountPoint is_mount_point = &NothingMounted;
   std::string share, root, queue_path;
   Folders configured;
