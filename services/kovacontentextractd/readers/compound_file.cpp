@@ -13,16 +13,19 @@ constexpr std::string_view kMark = "\xD0\xCF\x11\xE0\xA1\xB1\x1A\xE1";
 constexpr size_t kHeaderBytes = 512;
 constexpr uint32_t kLastSector = 0xFFFFFFFA;  ///< numbers beyond it have other meanings: end, free
 constexpr size_t kEntryBytes = 128;
-constexpr uint8_t kStorageType = 1, kStreamType = 2;
+constexpr uint8_t kStorageType = 1, kStreamType = 2;  // the root is 5
 
-/// Some programs write all names in capitals.
+/// Names are compared without case: some programs write all of them in capitals.
 bool IsSameName(std::string_view a, std::string_view b) {
   const auto lower = [](char c) { return c >= 'A' && c <= 'Z' ? static_cast<char>(c - 'A' + 'a') : c; };
   return std::equal(a.begin(), a.end(), b.begin(), b.end(), [&](char x, char y) { return lower(x) == lower(y); });
 }
+/// Entries of the directory that are read: office files have some dozens, messages a few for each property.
 constexpr size_t kEntriesMax = 65536;
 constexpr uint64_t kTableMax = 8U << 20;  ///< sectors: a file of 4 GiB
+/// Of one stream, what may be read.
 constexpr uint64_t kStreamMaxBytes = 128U << 20;
+/// How much a small read of a stream reads ahead.
 constexpr size_t kPieceBytes = 4096;
 
 }  // namespace
@@ -93,7 +96,8 @@ void CompoundFile::AppendTable(uint32_t sector, std::vector<uint32_t>& table) co
   }
 }
 
-/// The table's own sectors are listed in the header, and where that has no room, in a chain of further lists.
+/// The table's own sectors are listed in the header, which has room for 109, and in a chain of further sectors that are
+/// full of such numbers, the last of which names the next sector of the chain.
 void CompoundFile::ReadSectorTable(const std::string& header) {
   const auto append = [this](std::string_view list) {
     for (size_t at = 0; at + 4 <= list.size() && table_.size() < sectors_max_; at += 4) {
@@ -113,6 +117,7 @@ void CompoundFile::ReadSectorTable(const std::string& header) {
   }
 }
 
+/// The sectors that follow `first` in a table. A stream of `bytes` needs so many and no more, which also ends a ring.
 std::vector<uint32_t> CompoundFile::Chain(const std::vector<uint32_t>& table, uint32_t first, uint64_t bytes,
                                           uint32_t shift) {
   const uint64_t count = std::min<uint64_t>(table.size(), (bytes + (uint64_t{1} << shift) - 1) >> shift);
@@ -133,6 +138,9 @@ void CompoundFile::ReadMiniTable(uint32_t first) {
   }
 }
 
+/// The directory: entries of 128 bytes with a name (64 bytes of UTF-16), its size with the final zero (at 40), type (at
+/// 42), the numbers of its left and right neighbour in the tree and of the first entry within it (at 44, 48, 4C), its
+/// first sector (at 74) and size (at 78, of which the upper half is not read).
 void CompoundFile::ReadEntries(uint32_t first) {
   for (const uint32_t sector : Chain(table_, first, kEntriesMax * kEntryBytes, sector_shift_)) {
     const std::string bytes = ReadSector(sector);
@@ -156,7 +164,8 @@ void CompoundFile::ReadEntries(uint32_t first) {
   FindParents();
 }
 
-/// What no storage holds, because the tree is damaged, counts as the root's.
+/// Notes for each entry which storage it lies in, by a walk through the trees. What no storage holds, because a tree is
+/// damaged, counts as the root's, so that a document's main stream is found all the same.
 void CompoundFile::FindParents() {
   std::vector<std::pair<uint32_t, uint32_t>> open = {{entries_.front().child, kRoot}};
   while (!open.empty()) {

@@ -11,14 +11,16 @@ namespace ferrox::extract {
 
 class CompoundFile;
 
-/// One stream in a compound file.
+/// One stream in a compound file. It reads through the file, which must outlive it.
 class CompoundStream : public ByteSource {
  public:
   uint64_t Size() const { return size_; }
+  /// Small reads are served from a piece that is read ahead: records are read a few bytes at a time.
   size_t Read(char* buffer, size_t room) override;
   /// Passes `count` bytes, or all that are left.
   void Skip(uint64_t count) { at_ = count < size_ - at_ ? at_ + count : size_; }
   uint64_t Left() const { return size_ - at_; }
+  /// The bytes at `offset`, fewer where the stream ends; does not move the place that Read goes on from.
   std::string ReadAt(uint64_t offset, size_t size) const;
 
  private:
@@ -34,8 +36,18 @@ class CompoundStream : public ByteSource {
   uint64_t piece_at_ = 0;
 };
 
-/// The container of office files before they were ZIP files: a small file system. A chain of sectors that comes back on
-/// itself ends where more sectors would come than what it holds can have.
+/// The container of office files before they were ZIP files ([MS-CFB]): a small file system of storages (folders) and
+/// streams (files) in sectors.
+///
+/// The header of 512 bytes has the size of sectors as a power of two (at 1E, mostly 9 or 12), that of small sectors (at
+/// 20, 6), the first sector of the directory (at 30), the size below which a stream lies in small sectors (at 38), the
+/// first sector of the table of small sectors (at 3C), the chain of further lists of table sectors (at 44) and the
+/// first 109 of these (from 4C). The table has, for each sector, the number of the next one of the same stream. Streams
+/// below 4096 bytes lie in small sectors within one ordinary stream, whose first sector the root's entry names.
+///
+/// Nothing in it is trusted: a table has at most as many entries as the file has sectors, a chain at most as many
+/// sectors as the size of its stream needs, so one that comes back on itself ends, and the directory's tree is walked
+/// with each entry visited once.
 class CompoundFile {
  public:
   explicit CompoundFile(const Source& source);

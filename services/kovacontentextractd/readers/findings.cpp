@@ -20,6 +20,7 @@ constexpr size_t kNameMaxBytes = 255;
 constexpr std::string_view kLongField = "not all of a long field";
 constexpr std::string_view kBetweenValues = ", ";
 constexpr std::string_view kReplacement = "\xEF\xBF\xBD";
+/// What is cut off at both ends of a field: blanks, and the zeros that fixed fields are filled up with.
 constexpr std::string_view kBlanks("\0 \t\r\n\v\f", 7);
 
 /// Appends with a replacement for each byte that is part of no character, and a blank for each zero.
@@ -48,6 +49,7 @@ std::string FieldValue(std::string_view text, bool& cut) {
   return value;
 }
 
+/// A text without a copy, zeros in it included; empty for what is no text.
 std::string_view View(const Json::Value& value) {
   const char *begin = nullptr, *end = nullptr;
   if (!value.isString() || !value.getString(&begin, &end)) return {};

@@ -14,8 +14,13 @@ namespace {
 
 using namespace std::literals;
 
+// A reader of tags, not of documents: no tree is built, since all that counts of an element is its name and whether it
+// separates words. So anything that looks like markup can be read, in time proportional to its length: what is searched
+// for ahead (the end of a comment, a closing quote) is searched for once, or remembered.
+
 constexpr size_t kTitleMaxBytes = 1024;
 constexpr size_t kAttributeMaxBytes = 64 * 1024;
+/// Of a reference to a character, with "&" and ";".
 constexpr size_t kReferenceMaxBytes = 32;
 constexpr size_t kNotFound = std::string_view::npos;
 
@@ -124,6 +129,8 @@ bool IsInline(std::string_view name) {
 
 bool IsCell(std::string_view name) { return name == "td" || name == "th" || name == "img" || name == "input"; }
 
+/// Reads one document. HTML and XML differ in what they forgive: HTML has names without case, elements within a line
+/// and raw text in scripts; XML has prefixes, declarations within a document type, and "<" begins a tag anywhere.
 class Reader {
  public:
   Reader(std::string_view source, size_t limit_bytes, bool html)
@@ -150,6 +157,8 @@ class Reader {
     return in_title_ ? title_ : text_;
   }
 
+  /// What begins with the "<" at hand: a comment, raw characters, an instruction, a declaration, a tag, or a "<" that
+  /// the writer should have escaped.
   void ReadMarkup() {
     const std::string_view rest = source_.substr(at_);
     if (rest.substr(0, 4) == "<!--"sv) return SkipPast("-->"sv);
@@ -170,6 +179,7 @@ class Reader {
     at_ = found == kNotFound ? source_.size() : found + end.size();
   }
 
+  /// Characters that are text as they are, up to "]]>".
   void ReadCData() {
     const size_t begin = at_ + "<![CDATA["sv.size();
     const size_t end = source_.find("]]>"sv, begin);
@@ -198,6 +208,7 @@ class Reader {
     }
   }
 
+  /// A tag's name, in lower case for HTML and without its prefix for XML; of a longer one, the first 24 bytes.
   void ReadTag(bool closing) {
     const size_t begin = at_ + (closing ? 2 : 1);
     size_t end = begin;
@@ -238,6 +249,8 @@ class Reader {
     if (close < source_.size() && (is_file || close - at_ <= kAttributeMaxBytes)) at_ = close + 1;
   }
 
+  /// What an element's begin or end does to the text: opens or closes the title, drops what is not for people,
+  /// separates words or lines.
   void Enter(std::string_view name, bool closing, bool empty_element) {
     if (name == "title"sv) {
       in_title_ = !closing && !empty_element && title_.Empty();
@@ -259,6 +272,7 @@ class Reader {
     }
   }
 
+  /// Text between tags, with its references resolved.
   void AddCharacters(std::string_view characters) {
     TextSink& sink = Sink();
     while (!characters.empty()) {
@@ -299,11 +313,13 @@ class Reader {
       const auto value = static_cast<uint32_t>(digit ? c - '0' : lower - 'a' + 10);
       code_point = std::min<uint32_t>(code_point * (hex ? 16 : 10) + value, 0x110000);
     }
+    // Numbers that are control characters in Unicode are written by programs that think in Windows-1252.
     if (html_ && code_point >= 0x80 && code_point < 0xA0)
       return FromWindows1252(static_cast<unsigned char>(code_point));
     return code_point < 0x20 ? ' ' : code_point;
   }
 
+  /// XML has five names; others would need the document type, which is not read.
   static uint32_t XmlEntity(std::string_view name) {
     const bool known = name == "amp"sv || name == "lt"sv || name == "gt"sv || name == "quot"sv || name == "apos"sv;
     return known ? HtmlEntity(name) : 0;
@@ -315,6 +331,7 @@ class Reader {
   TextSink text_;
   TextSink title_;
   bool in_title_ = false;
+  // The next quotes of either kind, for attributes.
   NextByte next_double_{'"'};
   NextByte next_single_{'\''};
 };

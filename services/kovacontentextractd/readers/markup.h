@@ -15,11 +15,12 @@ struct MarkupText {
 };
 
 /// Tags become blanks or line ends, scripts and styles are dropped, references to characters are resolved, and runs of
-/// blanks are one.
+/// blanks are one. `source` is UTF-8; at most `limit_bytes` of text are kept, and reading ends there.
 MarkupText ReadHtml(std::string_view source, size_t limit_bytes);
 MarkupText ReadXml(std::string_view source, size_t limit_bytes);
 
-/// The encoding that the beginning of the content declares for itself; empty when it does not.
+/// The encoding that the beginning of the content declares for itself, as it is spelt there; empty when it does not.
+/// HTML does so in a <meta> element within the first 4096 bytes or as XML does; XML in its first line.
 std::string DeclaredHtmlEncoding(std::string_view head);
 std::string DeclaredXmlEncoding(std::string_view head);
 

@@ -13,6 +13,10 @@ namespace ferrox::extract {
 
 namespace {
 
+// BIFF, the format of Excel's files from 2 to 2003, is a row of records: a type (2 bytes), the size of the content (2
+// bytes, at most 8224 in BIFF8), the content. All numbers have their low byte first. Since Excel 5 the records are the
+// stream "Workbook" or "Book" of a compound file; before, they are the file itself. Read are: cells, notes, texts of
+// drawings and charts, names of sheets; of formulas the result, never the expression.
 enum RecordType : uint16_t {
   kBof2 = 0x0009,  // of Excel 2, and what follows it: of 3 and 4
   kBof3 = 0x0209,
@@ -43,10 +47,13 @@ enum RecordType : uint16_t {
   kTextObject = 0x01B6,
   kSeriesText = 0x100D,
 };
+/// The version in a kBof record of Excel 97 and later: texts are in UTF-16, or in its low bytes where these are enough.
+/// Before, they are in the code page that kCodePage names.
 constexpr uint16_t kBiff8 = 0x0600;
+/// More formats or styles than a workbook may have.
 constexpr size_t kStylesMax = 65536;
 
-/// The records of a workbook, one at a time.
+/// The records of a workbook, one at a time; of the last one, which may be cut off, what there is.
 class Records {
  public:
   explicit Records(ByteSource& stream) : stream_(stream) {}
@@ -68,8 +75,14 @@ class Records {
   std::string content_;
 };
 
-/// The table of texts, which goes on from record to record. Where a text is cut by the end of one, the next begins with
-/// a new byte that says whether its characters have one or two bytes.
+/// The table of texts (SST), to which cells of BIFF8 refer by number. Text is taken in the table's order, so that no
+/// table has to be kept in memory: a search does not ask in which cell a word stands.
+///
+/// The first record has two counts of 4 bytes, of which the second is that of the texts; the table goes on in kContinue
+/// records. A text is: length in characters (2 bytes), flags (1 byte: 1 two bytes a character, 4 phonetic data, 8 runs
+/// of formats), the number of runs (2 bytes, with flag 8), the size of the phonetic data (4 bytes, with flag 4), the
+/// characters, then runs of 4 bytes and phonetic data, which are passed over. Where the end of a record cuts the
+/// characters, the next record begins with a new byte of flags.
 class SharedTexts {
  public:
   SharedTexts(Records& records, Findings& findings) : records_(records), findings_(findings) {}
@@ -146,6 +159,8 @@ class SharedTexts {
   bool ended_ = false;
 };
 
+/// Reads a workbook of any version. All sheets of a book are one stream of records, so the row of a cell is all that is
+/// kept of its place: cells of one row are joined by tabs, in the order of the file.
 class WorkbookReader {
  public:
   WorkbookReader(ByteSource& stream, Findings& findings) : records_(stream), findings_(findings) {}
@@ -154,7 +169,7 @@ class WorkbookReader {
     bool have = records_.Next();
     if (!have || !IsBegin(records_.Type())) return findings_.Fail("damaged");
     biff8_ = records_.Type() == kBof && Little16(records_.Content(), 0) == kBiff8;
-    cell_bytes_ = records_.Type() == kBof2 ? 7 : 6;
+    cell_bytes_ = records_.Type() == kBof2 ? 7 : 6;  // Excel 2 has three bytes of attributes in place of a style
     while (have) {
       if (records_.Type() == kSharedTexts && biff8_) {
         have = SharedTexts(records_, findings_).Add();
@@ -165,7 +180,7 @@ class WorkbookReader {
   }
 
  private:
-  /// False when nothing more is to be read.
+  /// Takes what `record` says of the workbook or its sheets. False when nothing more is to be read.
   bool Take(std::string_view record) {
     switch (records_.Type()) {
       case kFilePass:
@@ -181,8 +196,26 @@ class WorkbookReader {
         return TakeFormat(record);
       case kExtendedFormat:
         return TakeStyle(record);
-      case kBoundSheet:
+      case kBoundSheet:  // the sheet's place (4 bytes) and kind (2), its name
         return AddLine(Text(record, 6, 1));
+      case kNote:
+        return biff8_ || AddLine(Text(record, 4, 2));
+      case kSeriesText:
+        return AddLine(Text(record, 2, 1));
+      case kTextObject:
+        object_characters_ = Little16(record, 10);
+        return true;
+      case kContinue:
+        return AddObjectText(record);
+      default:
+        return TakeCell(record);
+    }
+  }
+
+  /// Takes a cell: row, column, style (2 bytes each), then what the type of the record says. The numbers in the calls
+  /// are the place of the value, and of a text the bytes of its length.
+  bool TakeCell(std::string_view record) {
+    switch (records_.Type()) {
       case kLabel:
       case kRichLabel:
         return AddCell(record, Text(record, 6, 2));
@@ -205,15 +238,6 @@ class WorkbookReader {
       case kFormula3:
       case kFormula4:
         return TakeFormula(record);
-      case kNote:
-        return biff8_ || AddLine(Text(record, 4, 2));
-      case kSeriesText:
-        return AddLine(Text(record, 2, 1));
-      case kTextObject:
-        object_characters_ = Little16(record, 10);
-        return true;
-      case kContinue:
-        return AddObjectText(record);
       default:
         return true;
     }
@@ -221,7 +245,8 @@ class WorkbookReader {
 
   static bool IsBegin(uint16_t type) { return type == kBof2 || type == kBof3 || type == kBof4 || type == kBof; }
 
-  /// A result that is a text follows in a record of its own.
+  /// The result of a formula has 8 bytes: a number, unless the last two are FFFF. A text then follows in a record of
+  /// its own, which does not repeat the row; truth values and errors are left out.
   bool TakeFormula(std::string_view record) {
     const bool is_number = Little16(record, cell_bytes_ + 6) != 0xFFFF;
     if (is_number) return AddNumber(record, Double(record, cell_bytes_));
@@ -240,12 +265,14 @@ class WorkbookReader {
     return more;
   }
 
+  /// A number's format with its id, which styles refer to.
   bool TakeFormat(std::string_view record) {
     if (formats_.size() < kStylesMax)
       formats_[Little16(record, 0)] = ParseNumberFormat(Text(record, 2, biff8_ ? 2 : 1));
     return true;
   }
 
+  /// A style, of which cells name the number in the order of the file: only its number format matters here.
   bool TakeStyle(std::string_view record) {
     const int id = Little16(record, 2);
     const auto own = formats_.find(id);
@@ -253,7 +280,8 @@ class WorkbookReader {
     return true;
   }
 
-  /// The text at `at`, with its length in `length_bytes` before it.
+  /// The text at `at`: its length in `length_bytes`, in BIFF8 a byte of flags (1: two bytes a character), its
+  /// characters.
   std::string Text(std::string_view record, size_t at, size_t length_bytes) const {
     const auto length = static_cast<size_t>(LittleEndian(record, at, length_bytes));
     at += length_bytes;
@@ -267,13 +295,15 @@ class WorkbookReader {
     return std::bit_cast<double>(LittleEndian(record, at, 8));
   }
 
-  /// A number in 30 bits: an integer or the upper part of a float, perhaps to be divided by 100.
+  /// An RK number: 30 bits of an integer (bit 1 set) or the upper 30 bits of a double (not set), which bit 0 says to
+  /// divide by 100.
   static double Short(uint32_t packed) {
     const double value = (packed & 2) != 0 ? static_cast<double>(static_cast<int32_t>(packed) >> 2)
                                            : std::bit_cast<double>(uint64_t{packed & ~3U} << 32);
     return (packed & 1) != 0 ? value / 100 : value;
   }
 
+  /// Several numbers side by side: row, first column, then style (2 bytes) and RK number (4) of each, last column.
   bool AddShortNumbers(std::string_view record) {
     for (size_t at = 4; at + 6 + 2 <= record.size(); at += 6) {
       if (!AddValue(Little16(record, 0), Little16(record, at), Short(Little32(record, at + 2)))) return false;

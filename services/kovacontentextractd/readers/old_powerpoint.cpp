@@ -11,8 +11,12 @@ namespace ferrox::extract {
 
 namespace {
 
+// The stream "PowerPoint Document" of PowerPoint 97 to 2003 is a tree of records with a head of 8 bytes: version and
+// instance (2 bytes, 15 in the low 4 bits for a record that holds others), type (2), size of the content (4). Text
+// stands in two types of record, in UTF-16 or in its low bytes; a file that was saved fast has old versions of slides
+// too, whose text is read as well.
 enum RecordType : uint16_t {
-  kMainMaster = 0x03F8,
+  kMainMaster = 0x03F8,  ///< "Click to edit the title", not the author's words
   kHandout = 0x0FC9,
   kTextUtf16 = 0x0FA0,
   kTextBytes = 0x0FA8,
@@ -21,8 +25,9 @@ enum RecordType : uint16_t {
   kExtension = 0x138B,  ///< holds what later versions of the program added, comments among it
   kComment = 0x2EE0,
 };
-constexpr size_t kTextMaxBytes = 1U << 20;
+constexpr size_t kTextMaxBytes = 1U << 20;  ///< of one record
 
+/// The stream "Current User" has a token at 0C that differs for an encrypted document.
 bool IsEncrypted(const CompoundFile& file) {
   constexpr uint32_t kEncryptedToken = 0xF3D1C4DF;
   const auto user = file.Open("Current User");

@@ -11,6 +11,11 @@
 /// Readers get text and metadata out of one file. They run in a worker without file system and without rights: all they
 /// have is the open file. They may be given anything, and must not trust a byte of it; what the kernel enforces on the
 /// worker (memory, time) is the last line, not the first.
+///
+/// Each reader has a header with one function of the type Reader and, where its library needs files, one that loads
+/// these beforehand; the programs in workers/ list them by the names that kova/content_type.h knows. A reader reads as
+/// far as it can and says in the findings what stopped it; it keeps a bound of its own on all that a file can make
+/// long: depth, numbers of things, bytes unpacked, time.
 namespace ferrox::extract {
 
 /// What bounds every reader.
@@ -42,7 +47,7 @@ struct Source {
   int depth = 0;               ///< how many files it is inside of
 };
 
-/// What was found, collected within the limits.
+/// What a reader found in one file, collected within the limits. For one thread.
 class Findings {
  public:
   explicit Findings(const Limits& limits = {}) : limits_(limits) {}

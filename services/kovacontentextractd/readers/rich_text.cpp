@@ -19,16 +19,26 @@ namespace {
 
 using namespace std::literals;
 
+// RTF is ASCII: groups in braces, control words ("\par", "\u8217", with an optional number and one blank that ends
+// them), control symbols ("\~") and text. A group inherits the state of the one around it and gives it back at its
+// end. Some words make their group a destination: the text in it is not the document's, but a font's name, a title, a
+// picture. Characters outside ASCII are "\'e9", a byte in the code page of the present font, or "\u233", a number in
+// UTF-16, followed by what programs without Unicode show instead ("\uc" says how many bytes). Bytes of one encoding
+// are collected and converted together, since East Asian characters have two.
+
+/// Groups within groups; more is an attack.
 constexpr size_t kDepthMax = 2000;
 constexpr size_t kFontsMax = 10000;
+/// How much text is collected before it is handed on, and the longest text of a field.
 constexpr size_t kPieceBytes = 32U << 10;
 constexpr int kMacRoman = 10000;
-/// Pictures are most of a long file, written in letters.
+/// The processor time for one file. Pictures are most of a long file, written in hexadecimal digits.
 constexpr std::chrono::milliseconds kCpuMax(1500);
 
 /// Where text goes in a group.
 enum class Target : uint8_t { kText, kNowhere, kFontTable, kField };
 
+/// The state that a group has of its own.
 struct Group {
   Target target = Target::kText;
   const char* field = nullptr;  ///< of kField
@@ -38,6 +48,7 @@ struct Group {
   int unicode_fallback = 1;  ///< characters behind a Unicode one, for programs that do not know it
 };
 
+/// A control word that makes its group a destination.
 struct NamedTarget {
   std::string_view word;
   Target target;
@@ -77,6 +88,7 @@ constexpr NamedTarget kTargets[] = {
     {"shptxt", Target::kText},
 };
 
+/// A control word that stands for a character.
 struct NamedCharacter {
   std::string_view word;
   uint32_t code;
@@ -89,7 +101,7 @@ constexpr NamedCharacter kCharacters[] = {
     {"emspace", ' '},   {"enspace", ' '},
 };
 
-/// The code page of a font's character set.
+/// The code page of a font's character set ("\fcharset"); 0 for one that is not known.
 int CodePageOf(int charset) {
   static constexpr std::array<std::pair<int, int>, 17> kCharsets = {{{0, 1252},
                                                                      {77, kMacRoman},
@@ -122,6 +134,7 @@ int HexDigit(int c) {
   return lower >= 'a' && lower <= 'f' ? lower - 'a' + 10 : -1;
 }
 
+/// Reads a file in one pass, with memory for the open groups and the table of fonts.
 class RichTextReader {
  public:
   RichTextReader(const Source& source, Findings& findings) : source_(source), findings_(findings), groups_(1) {}
@@ -156,6 +169,7 @@ class RichTextReader {
   /// Of the byte that Get gave last, if it gave one.
   void Unget() { at_ -= size_ > 0 ? 1 : 0; }
 
+  /// "{": the new group has the state of the one around it.
   void Open() {
     FlushBytes();
     if (groups_.size() == kDepthMax) return Stop("damaged");
@@ -164,6 +178,7 @@ class RichTextReader {
     optional_ = false;
   }
 
+  /// "}": a field's text is complete where its destination ends.
   void Close() {
     FlushBytes();
     const Group closed = Top();
@@ -176,6 +191,7 @@ class RichTextReader {
     value_.clear();
   }
 
+  /// What follows a "\": a byte in hexadecimal digits, a symbol, or a word with its number.
   void ReadControl() {
     const int c = Get();
     if (c == '\'') return ReadHexByte();
@@ -210,6 +226,7 @@ class RichTextReader {
     if (c == '*') optional_ = true;
   }
 
+  /// Does what a control word says. Those that only say what text looks like are not known here, and do nothing.
   void Do(std::string_view word, int number) {
     if (word == "u"sv) return AddUnicode(number);
     if (word == "uc"sv) {
@@ -252,6 +269,7 @@ class RichTextReader {
     if (Top().is_aside) AddCharacter('\n');
   }
 
+  /// "\f": within the table the font that is described, elsewhere the one that the text is in.
   void SelectFont(int number) {
     FlushBytes();
     if (Top().target == Target::kFontTable) {
@@ -268,6 +286,7 @@ class RichTextReader {
     if (number > 1) ansi_code_page_ = Top().code_page = is_ansi ? 1252 : number;
   }
 
+  /// "\fcharset" of the font that is described; 0 and 1 stand for the document's own code page.
   void SetCharset(int charset) {
     if (Top().target == Target::kFontTable && fonts_.size() < kFontsMax) {
       fonts_[font_] = charset <= 1 ? ansi_code_page_ : CodePageOf(charset);
@@ -293,6 +312,7 @@ class RichTextReader {
     if (const auto seconds = ToSeconds(time)) findings_.SetInteger("KOVAMDContentCreationDate", *seconds);
   }
 
+  /// "\bin": so many bytes of a picture follow as they are, braces among them.
   void SkipBytes(int count) {
     if (count <= 0) return;
     const size_t here = std::min(static_cast<size_t>(count), size_ - at_);
@@ -300,6 +320,7 @@ class RichTextReader {
     source_.Skip(static_cast<uint64_t>(count) - here);
   }
 
+  /// A byte of text, in the code page of the group.
   void AddByte(char byte) {
     if (fallback_left_ > 0) {
       --fallback_left_;
@@ -310,6 +331,7 @@ class RichTextReader {
     if (bytes_.size() >= kPieceBytes) FlushBytes();
   }
 
+  /// "\u": one unit of UTF-16; characters beyond U+FFFF are two of them.
   void AddUnicode(int number) {
     FlushBytes();
     const auto unit = static_cast<uint16_t>(number);  // written as a signed number
@@ -340,6 +362,7 @@ class RichTextReader {
     if (text_.size() >= kPieceBytes) FlushText();
   }
 
+  /// Where the group's text goes; null when it is dropped.
   std::string* Out() {
     if (Top().target == Target::kText) return &text_;
     return Top().target == Target::kField && value_.size() < kPieceBytes ? &value_ : nullptr;
@@ -364,10 +387,10 @@ class RichTextReader {
   std::map<int, int> fonts_;  ///< their code pages
   int font_ = 0;              ///< the one in the table that is being read
   int ansi_code_page_ = 1252;
-  bool optional_ = false;
-  int fallback_left_ = 0;
-  uint32_t high_surrogate_ = 0;
-  std::string bytes_;  ///< in the group's code page
+  bool optional_ = false;        ///< "\*" stood before: a word that is not known makes its group one to be dropped
+  int fallback_left_ = 0;        ///< bytes that are to be dropped behind a "\u"
+  uint32_t high_surrogate_ = 0;  ///< the first half of a character, while its second one is to come
+  std::string bytes_;            ///< in the group's code page
   std::string text_;
   std::string value_;  ///< of a field
   bool done_ = false;

@@ -19,8 +19,10 @@ constexpr size_t kMarkupMaxBytes = 16U << 20;
 /// How much of a file that is no text is looked at to tell what it is.
 constexpr size_t kMagicBytes = 64U << 10;
 
+/// The library's table, loaded once before the sandbox closes; null when it could not be. Of the worker's one thread.
 magic_t g_magic = nullptr;
 
+/// The beginning of a file.
 struct Head {
   std::string bytes;
   bool cut = false;
@@ -49,7 +51,8 @@ using Markup = MarkupText (*)(std::string_view source, size_t limit_bytes);
 
 std::string DeclaresNothing(std::string_view) { return {}; }
 
-/// False when the bytes are no text.
+/// Decodes the bytes by their own marks and what `declared` finds in them, and adds their text: what `markup` leaves of
+/// it, or all. False when the bytes are no text.
 bool AddDecoded(const Head& head, DeclaredEncoding declared, Markup markup, Findings& findings) {
   DecodedText decoded;
   if (!Decode(head.bytes, head.cut, declared(head.bytes), decoded)) return false;

@@ -2,7 +2,9 @@
 
 #include "services/kovacontentextractd/readers/reader.h"
 
-/// Readers of what is text by itself, in whatever encoding. Besides text and title they set "_KOVATextEncoding".
+/// Readers of what is text by itself, in whatever encoding (encoding.h). Besides text and title they set
+/// "_KOVATextEncoding". Of plain text the first 2 MiB are read, of markup the first 16 MiB; a file that holds something
+/// else than text fails with "not text".
 namespace ferrox::extract {
 
 void ReadPlainFile(const Source& source, Findings& findings);

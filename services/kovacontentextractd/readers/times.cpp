@@ -6,7 +6,9 @@ namespace {
 
 constexpr int64_t kDaySeconds = 86400;
 
-/// Days since 1970 of a date in the Gregorian calendar, counted in eras of 400 years that begin in March.
+/// Days since 1970 of a date in the Gregorian calendar, counted in eras of 400 years (146097 days) that begin on 1
+/// March: so the leap day is the last of its year, and month lengths repeat every 5 months with 153 days. 719468 days
+/// lie between 1 March of the year 0 and 1970.
 int64_t DaysOf(int64_t year, int month, int day) {
   year -= month <= 2 ? 1 : 0;
   const int64_t era = (year >= 0 ? year : year - 399) / 400;
@@ -27,6 +29,7 @@ std::optional<int> TakeNumber(std::string_view& text, size_t digits) {
   return length > 0 ? std::optional<int>(value) : std::nullopt;
 }
 
+/// Takes one character off the text when it is one of these.
 bool Take(std::string_view& text, std::string_view any_of) {
   if (text.empty() || any_of.find(text.front()) == std::string_view::npos) return false;
   text.remove_prefix(1);

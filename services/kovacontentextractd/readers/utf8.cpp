@@ -56,6 +56,7 @@ size_t ValidBytes(const unsigned char* bytes, size_t size) {
 
 }  // namespace
 
+/// Whole blocks by the processor's vector instructions, the rest, and what these refuse, byte by byte.
 size_t ValidUtf8Prefix(std::string_view text) {
   const auto* bytes = reinterpret_cast<const unsigned char*>(text.data());
   const size_t checked = ValidUtf8Blocks(bytes, text.size());

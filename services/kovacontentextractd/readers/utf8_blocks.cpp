@@ -43,6 +43,7 @@ alignas(16) constexpr uint8_t kSecondUpper[16] = {
     kShort, kShort, kShort, kShort};                                 // C0 to FF
 // clang-format on
 
+/// For functions with instructions that not every processor of this architecture has; callers ask first.
 #define FERROX_SSSE3 __attribute__((target("ssse3")))
 
 FERROX_SSSE3 __m128i Load(const uint8_t* bytes) { return _mm_loadu_si128(reinterpret_cast<const __m128i*>(bytes)); }
@@ -63,6 +64,7 @@ FERROX_SSSE3 bool IsRight(__m128i block, __m128i before) {
   return _mm_movemask_epi8(_mm_cmpeq_epi8(must, wrong)) == 0xFFFF;
 }
 
+/// How many bytes at the beginning lie in blocks without fault.
 FERROX_SSSE3 size_t RightBlocks(const unsigned char* bytes, size_t size) {
   size_t at = 0;
   for (__m128i before = _mm_setzero_si128(); size - at >= 16; at += 16) {

@@ -11,6 +11,7 @@ namespace {
 
 using namespace std::literals;
 
+// What is kept of each thing in a document; the rest is read and dropped.
 constexpr size_t kNameMaxBytes = 128;
 constexpr size_t kValueMaxBytes = 16U << 10;
 constexpr size_t kAttributesMax = 64;
@@ -52,6 +53,7 @@ uint32_t NumericReference(std::string_view name) {
   return code > 0x10FFFF || (code >= 0xD800 && code <= 0xDFFF) ? 0 : code;
 }
 
+/// The character of a reference, without "&" and ";"; 0 for an entity that a document type would have to define.
 uint32_t Reference(std::string_view name) {
   if (name == "amp"sv) return '&';
   if (name == "lt"sv) return '<';
@@ -85,7 +87,8 @@ std::string_view XmlTokenizer::PrefixedAttribute(std::string_view local_name) co
   return {};
 }
 
-// --- the buffer
+// --- the buffer: UTF-8 from begin_ to end_, refilled when less is left than a step needs. Views into it, such as Text,
+// hold until the next refill.
 
 /// Makes room and reads more; false when nothing more comes.
 bool XmlTokenizer::Refill() {
@@ -105,6 +108,8 @@ bool XmlTokenizer::Refill() {
   return end_ > before;
 }
 
+/// By the first bytes: a byte order mark, or "<" with a zero beside it. All else is read as UTF-8, which ASCII is too;
+/// office files are nothing else, whatever their declaration says.
 void XmlTokenizer::DetectCharset() {
   while (wide_size_ < 4) {
     const size_t got = source_.Read(wide_.data() + wide_size_, 4 - wide_size_);
@@ -122,6 +127,8 @@ void XmlTokenizer::DetectCharset() {
   end_ = kept.size();
 }
 
+/// Reads UTF-16 and appends it to the buffer as UTF-8. A unit of which only one byte has come, and the first half of a
+/// pair, wait in wide_ for the rest.
 void XmlTokenizer::FillUtf16() {
   do {
     const size_t got = source_.Read(wide_.data() + wide_size_, wide_.size() - wide_size_);
@@ -152,6 +159,7 @@ void XmlTokenizer::FillUtf16() {
   end_ += text.size();
 }
 
+/// Whether `count` more bytes are there, after a refill if need be.
 bool XmlTokenizer::Has(size_t count) {
   while (end_ - begin_ < count) {
     if (!Refill()) return false;
@@ -163,6 +171,7 @@ bool XmlTokenizer::StartsWith(std::string_view text) {
   return Has(text.size()) && Rest().substr(0, text.size()) == text;
 }
 
+/// Passes everything up to `end` and that; what may be the beginning of it is kept when the buffer is refilled.
 bool XmlTokenizer::SkipPast(std::string_view end) {
   while (Has(end.size())) {
     const size_t found = Rest().find(end);
@@ -180,7 +189,8 @@ void XmlTokenizer::SkipBlanks() {
   while (Has(1) && IsBlank(buffer_[begin_])) ++begin_;
 }
 
-// --- the tokens
+// --- the tokens: each of these functions is called with the first byte of its token at begin_, and leaves what follows
+// it there.
 
 XmlTokenizer::Token XmlTokenizer::Bad() {
   bad_ = true;
@@ -214,6 +224,7 @@ void XmlTokenizer::SkipElement() {
   for (Token token; depth_ > outside && Next(token);) continue;
 }
 
+/// Text up to the next tag or reference, or what the buffer has of it.
 XmlTokenizer::Token XmlTokenizer::ReadText() {
   const std::string_view rest = Rest();
   const size_t size = FindEither(rest, '<', '&');
@@ -247,6 +258,7 @@ XmlTokenizer::Token XmlTokenizer::ReadReference() {
   return Token::kText;
 }
 
+/// Text as it is, up to "]]>", or what the buffer has of it.
 XmlTokenizer::Token XmlTokenizer::ReadCData() {
   (void)Has(4);
   const std::string_view rest = Rest();
@@ -262,6 +274,8 @@ XmlTokenizer::Token XmlTokenizer::ReadCData() {
   return TakeText(safe.size() - CutOffBytes(safe));
 }
 
+/// What begins with "<". Comments, instructions and the document type are no tokens: an empty text stands for them,
+/// which Next passes over.
 XmlTokenizer::Token XmlTokenizer::ReadMarkup() {
   text_ = {};
   if (Has(2) && buffer_[begin_ + 1] != '!' && buffer_[begin_ + 1] != '?') return ReadTag();
@@ -280,6 +294,7 @@ XmlTokenizer::Token XmlTokenizer::ReadMarkup() {
   return Token::kText;
 }
 
+/// Passes a document type with its declarations in brackets, none of which is read: no entity can expand to anything.
 bool XmlTokenizer::SkipDocumentType() {
   char quote = '\0';
   bool inside = false;
@@ -299,6 +314,8 @@ bool XmlTokenizer::SkipDocumentType() {
   return false;
 }
 
+/// A tag with its attributes. "<a/>" is a kOpen, and a kClose that close_pending_ stands for. A tag that another "<"
+/// cuts off counts as ended there.
 XmlTokenizer::Token XmlTokenizer::ReadTag() {
   ++begin_;
   if (!Has(1)) return Token::kEnd;
@@ -341,6 +358,8 @@ void XmlTokenizer::ReadName(std::string& name) {
   }
 }
 
+/// Name, "=", quoted value; a value without quotes is left out. The strings of earlier tags are used again, so that
+/// reading attributes does not allocate.
 void XmlTokenizer::ReadAttribute() {
   if (attribute_count_ == attributes_.size()) attributes_.emplace_back();
   NamedValue& attribute = attributes_[attribute_count_];
