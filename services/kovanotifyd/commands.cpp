@@ -61,6 +61,7 @@ Json::Value OnStatus(Notifier& notifier, const Json::Value&) {
   return reply;
 }
 
+/// Takes the "data" of a request and gives that of the reply.
 struct Command {
   const char* type;
   Json::Value (*run)(Notifier& notifier, const Json::Value& data);

@@ -9,7 +9,7 @@
 
 namespace ferrox::notifyd {
 
-/// Open for reading, so that its closing is no end of a write.
+/// Opened for reading: closing a file that was open for writing would be reported as a change.
 Cookie::Cookie(const std::string& path) : path_(path) {
   (void)services::MakeFolders(Dirname(path));
   file_.Reset(open(path.c_str(), O_RDONLY | O_CREAT | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK, 0600));

@@ -6,15 +6,16 @@
 
 namespace ferrox::notifyd {
 
-/// A file whose times are set to find out how far a watcher is: nothing is written, so a full disk is no obstacle.
+/// A file whose times are set to find out how far a watcher has read (watcher.h). Setting them writes no data, so a
+/// sync works on a full disk too.
 class Cookie {
  public:
-  /// Makes the file, and the folders above it, when it is missing.
+  /// Makes the file, and the folders above it, when they are missing.
   /// @throws Error kInternal when that fails.
   explicit Cookie(const std::string& path);
 
   const std::string& Path() const { return path_; }
-  /// False, with errno set, when it fails.
+  /// Sets the times to now. False, with errno set, when that fails.
   bool Touch() const;
 
  private:

@@ -16,10 +16,11 @@ namespace ferrox::notifyd {
 namespace {
 
 constexpr size_t kBufferBytes = 256U << 10;
-// Before a handle's own bytes: how many they are, and their type, 4 bytes each.
+// A handle begins with the number of its own bytes and their type, 4 bytes each.
 constexpr size_t kHandleHeader = 8;
 constexpr unsigned kMarkFolder = FAN_MARK_ONLYDIR | FAN_MARK_DONT_FOLLOW;
-// Newer than the headers of some hosts. Asks for the handle that records carry, also where none can be opened.
+// AT_HANDLE_FID, newer than the headers of some hosts: a handle as in records, also where the file system cannot open
+// it.
 constexpr int kHandleFid = 0x200;
 
 unsigned Flags(FanGroup::Scope scope) {
@@ -41,15 +42,16 @@ std::string OpenReason(int error) {
   return "fanotify cannot be opened: " + std::string(strerror(error));
 }
 
-/// How many bytes of the key the file system's number takes.
+/// How many bytes of the key the file system's number takes (EncodeKey).
 size_t NumberLength(const HandleKey& key) { return (static_cast<unsigned char>(key[0]) & 0x80U) != 0 ? 2 : 1; }
 
-/// A handle as name_to_handle_at and open_by_handle_at want it.
+/// Room for a handle as name_to_handle_at and open_by_handle_at take it.
 struct HandleBuffer {
   alignas(file_handle) char bytes[sizeof(file_handle) + MAX_HANDLE_SZ] = {};
   file_handle* Get() { return reinterpret_cast<file_handle*>(bytes); }
 };
 
+/// Asks again for one that cannot be opened where the file system has no other. False with errno set.
 bool GetHandle(int fd, HandleBuffer& buffer) {
   int mount_id = 0;
   buffer.Get()->handle_bytes = MAX_HANDLE_SZ;
@@ -142,7 +144,7 @@ void FanGroup::Parse(const char* bytes, size_t size, std::vector<FanRecord>& rec
   }
 }
 
-/// Reads a handle, with the name behind it if there is one. False when the lengths in it make no sense.
+/// Reads one info of a record: a handle, with a name behind it in some. False when its lengths contradict each other.
 bool FanGroup::ParseInfo(const char* info, size_t size, FanRecord& record) {
   const uint8_t type = Load<fanotify_event_info_header>(info).info_type;
   const bool is_old = type == FAN_EVENT_INFO_TYPE_DFID_NAME || type == FAN_EVENT_INFO_TYPE_DFID ||
@@ -171,7 +173,7 @@ bool FanGroup::ParseInfo(const char* info, size_t size, FanRecord& record) {
   return true;
 }
 
-/// A file system's number within this group: keys carry it instead of the kernel's 8 bytes.
+/// The file system's number in this group, which keys have instead of the kernel's 8 bytes.
 size_t FanGroup::Number(const FileSystemId& id) {
   if (last_number_ < file_systems_.size() && file_systems_[last_number_] == id) return last_number_;
   const auto found = std::find(file_systems_.begin(), file_systems_.end(), id);
@@ -180,7 +182,8 @@ size_t FanGroup::Number(const FileSystemId& id) {
   return last_number_;
 }
 
-/// `handle` is the length, the type and the bytes.
+/// A key is the file system's number (1 byte below 0x80, else 2 with the highest bit set), the handle's type (1 byte)
+/// and the handle's bytes. `handle` is the length, the type and the bytes. "" for numbers and types beyond that form.
 HandleKey FanGroup::EncodeKey(size_t file_system, const char* handle, size_t size) const {
   const auto type = Load<int32_t>(handle + sizeof(uint32_t));
   if (file_system >= 0x8000U || type < 0 || type > 0xFF) return {};
@@ -211,7 +214,7 @@ HandleKey FanGroup::KeyOf(int fd, const HandleKey& sibling) {
   return EncodeKey(number, buffer.bytes, buffer.Get()->handle_bytes);
 }
 
-/// Where the numbers are of all but a few file systems; a number of 8 bytes first, of which one of 4 may be a part.
+/// Tries where nearly all file systems have it, 8 bytes first: the first 4 of these are often the number too.
 FanGroup::NumberPlace FanGroup::FindNumber(const HandleKey& key, uint64_t number) {
   for (const NumberPlace place : {NumberPlace{0, 8}, NumberPlace{4, 8}, NumberPlace{0, 4}}) {
     if (number != 0 && NumberIn(key, place) == number) return place;

@@ -14,48 +14,50 @@
 
 namespace ferrox::notifyd {
 
-/// What a file system knows a folder or file by, wherever it is moved to: bytes that are compared, hashed and stored
-/// and have no further meaning outside of FanGroup. "" is none. Those of ext4, xfs and tmpfs need no memory of their
-/// own.
+/// The file handle of a folder or file with a number for its file system: stays the same wherever it is moved. Outside
+/// of FanGroup the bytes have no meaning; they are compared, hashed and stored. "" is none. Those of ext4, xfs and
+/// tmpfs are so short that the string needs no memory of its own.
 using HandleKey = std::string;
 
-/// One record of the kernel. The names live as long as the batch; a folder's change of its own has its own key as
-/// `folder` and the name ".".
+/// One record of the kernel. The names are valid as long as the batch. A change of a folder itself, rather than of a
+/// name in it, has that folder as `folder` and the name ".".
 struct FanRecord {
-  uint64_t mask = 0;  ///< FAN_CREATE and so on; several, when the kernel has joined changes of the same name and object
-  int32_t pid = 0;    ///< 0 without the capability CAP_SYS_ADMIN
-  HandleKey folder = {};  ///< where `name` is; of a rename, the old place, "" when that one is not marked
+  uint64_t mask = 0;      ///< FAN_CREATE and so on; several bits when the kernel joined changes of one name and object
+  int32_t pid = 0;        ///< 0 without the capability CAP_SYS_ADMIN
+  HandleKey folder = {};  ///< that has `name`; of a rename, the old folder, "" when that one is not marked
   std::string_view name = {};
-  HandleKey new_folder = {};  ///< of a rename, the new place, "" when that one is not marked
+  HandleKey new_folder = {};  ///< of a rename, the new folder, "" when that one is not marked
   std::string_view new_name = {};
-  HandleKey target = {};  ///< what the name names or named
+  HandleKey target = {};  ///< the file or folder that has, or had, the name
 
   bool IsFolder() const { return (mask & FAN_ONDIR) != 0; }
-  /// The kernel dropped records, here.
+  /// Whether the kernel dropped records at this point of the order.
   bool IsOverflow() const { return (mask & FAN_Q_OVERFLOW) != 0; }
 };
 
-/// Records in the order in which the kernel queued them, and the memory that their names are in.
+/// Records in the order in which the kernel queued them, with the memory that their names point into.
 struct FanBatch {
   std::unique_ptr<char[]> bytes = {};
   std::vector<FanRecord> records = {};
 };
 
-/// A notification group of the kernel whose records tell names by the folder that they are in, and folders by handles.
-/// Belongs to one thread.
+/// A fanotify group of the kernel, whose records name what changed by the handle of its folder and its name there, and
+/// of the encoding of these handles as keys. Belongs to one thread.
 class FanGroup {
  public:
   enum class Scope : uint8_t { kFolder, kFileSystem };
 
   FanGroup() = default;
 
-  /// Opens the group, non-blocking; "" or why there is none, without a full stop and with the remedy.
+  /// Opens the group for reading that does not block. @return "", or why that fails, with the remedy and without a full
+  /// stop.
   std::string Open();
   bool IsOpen() const { return fd_.Valid(); }
   /// Readable when there are records.
   int Fd() const { return fd_.Get(); }
 
-  /// Marks a folder, or the whole file system that it is on. Masks of the same folder add up.
+  /// Marks a folder, or the whole file system that it is on: the kinds of changes in `mask` are reported from then on,
+  /// beside those that it was marked for before.
   /// @return 0 or an errno, which Reason explains.
   int Mark(const std::string& path, Scope scope, uint64_t mask);
   /// The same for an open folder; also one that was opened with O_PATH.
@@ -63,40 +65,39 @@ class FanGroup {
   /// Takes `mask` away; 0 or an errno.
   int Unmark(const std::string& path, Scope scope, uint64_t mask);
   int Unmark(int folder, Scope scope, uint64_t mask);
-  /// No more records of these kinds for a folder's names, whatever else is marked, while the kernel has the folder in
-  /// memory. 0 or an errno; EINVAL before Linux 6.0.
+  /// Leaves out records of these kinds for names in a folder, whatever else is marked, until the kernel drops the
+  /// folder from memory. 0 or an errno; EINVAL before Linux 6.0.
   int Ignore(int folder, uint64_t mask);
-  /// Why marking failed, a sentence without a full stop.
+  /// Why marking failed with that errno: a sentence without a full stop.
   static std::string Reason(int error, Scope scope);
 
-  /// Reads one batch, some thousand records at most; its records take the place of those in `batch`.
+  /// Reads one batch, some thousand records at most, in place of what `batch` has.
   /// @return 0, EAGAIN when there is nothing, or another errno.
   int Read(FanBatch& batch);
 
-  /// The key of an open folder or file as records carry it, or "" with errno set.
+  /// The key of an open folder or file, equal to that in its records; "" with errno set when there is none.
   HandleKey KeyOf(int fd);
-  /// The same, when it is on the file system of `sibling`; a little cheaper.
+  /// The same for something on the file system of `sibling`; a system call cheaper.
   HandleKey KeyOf(int fd, const HandleKey& sibling);
-  /// How many bytes of a key's handle are before the file's number, and how many the number has, both 0 when that is
-  /// not known: each kind of file system has its own form.
+  /// Where in a handle its file's inode number is: file systems differ in that. Both 0 when it is not known.
   struct NumberPlace {
-    uint8_t at = 0;
-    uint8_t size = 0;
+    uint8_t at = 0;    ///< bytes of the handle before it
+    uint8_t size = 0;  ///< its own bytes
   };
-  /// Found by the key of something whose number is known.
+  /// Finds the place in the key of a file whose number is known.
   static NumberPlace FindNumber(const HandleKey& key, uint64_t number);
-  /// The number in the key's handle; 0 when it has none there.
+  /// The number at that place; 0 when the key has none there.
   static uint64_t NumberIn(const HandleKey& key, NumberPlace place);
-  /// Keys with the same form have it in the same place.
+  /// A text that is the same for keys that have the number in the same place: file system, handle's type and length.
   static std::string FormOf(const HandleKey& key);
 
-  /// Whether both are of one file system.
+  /// Whether both keys are of one file system.
   static bool IsSameFileSystem(const HandleKey& a, const HandleKey& b);
-  /// Opens what the key stands for; `mount` is any folder open on its file system. Not valid with errno set, ESTALE
-  /// when it is removed. Needs CAP_DAC_READ_SEARCH.
+  /// Opens the file or folder of a key; `mount` is any open folder on its file system. Not valid with errno set when
+  /// that fails; ESTALE when it was removed. Needs CAP_DAC_READ_SEARCH.
   static base::UniqueFd OpenKey(const HandleKey& key, int mount, int flags);
 
-  /// Reads the records in a kernel's answer, as far as they are whole. For Read and tests.
+  /// Appends the records in the kernel's answer, as far as they are whole, to `records`. For Read and tests.
   void Parse(const char* bytes, size_t size, std::vector<FanRecord>& records);
 
  private:
@@ -109,8 +110,8 @@ class FanGroup {
 
   base::UniqueFd fd_;
   std::unique_ptr<char[]> buffer_;
-  std::vector<FileSystemId> file_systems_;
-  size_t last_number_ = 0;
+  std::vector<FileSystemId> file_systems_;  ///< by the number that keys have in their place
+  size_t last_number_ = 0;                  ///< that was looked up: mostly the next one too
 };
 
 }  // namespace ferrox::notifyd

@@ -24,6 +24,7 @@ RegistryWatch::RegistryWatch(std::string folder)
   Rearm();
 }
 
+/// The watch is set again each time: a folder that was removed takes its watch with it.
 void RegistryWatch::Rearm() {
   if (!inotify_.Valid()) return;
   char events[4096];

@@ -17,10 +17,12 @@ namespace {
 
 struct KnownWay {
   const char* name;
-  const char* cookie;
+  const char* cookie;  ///< the name of its file
+  /// Null, and a `refusal`, when this host does not have what the way needs.
   std::unique_ptr<Watcher> (*make)(const std::string& cookie_path, std::string& refusal);
 };
 
+/// Never null: which capabilities and file systems it needs is found out for each root.
 std::unique_ptr<Watcher> MakeFilesystemWatcher(const std::string& cookie_path, std::string& /*refusal*/) {
   FilesystemWatcher::Options options;
   options.cookie = cookie_path;

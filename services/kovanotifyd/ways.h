@@ -7,12 +7,12 @@
 
 namespace ferrox::notifyd {
 
-/// Fills in by which ways folders may be watched, each with its cookie below the instance's state folder. `allowed`
-/// names them, in any order: "fanotify", "fanotify inode marks", "inotify" and "periodic scan". A name that is none of
-/// these becomes a problem.
+/// Fills in the ways in which folders can be watched here, the best first, each with its watcher and its cookie below
+/// the instance's state folder. `allowed` has the names of those that the settings allow, in any order: "fanotify",
+/// "fanotify inode marks", "inotify" and "periodic scan". Other names are added to the problems.
 void ChooseWays(const std::vector<std::string>& allowed, Notifier::Options& options);
 
-/// Where the files of this instance's daemons lie, and the beginnings of their names.
+/// Beginnings of the paths of the files that belong to this instance's daemons (Notifier::Options::own_paths).
 std::vector<std::string> OwnPaths();
 
 }  // namespace ferrox::notifyd

@@ -63,7 +63,8 @@ void FolderCache::Unlink(Folder& folder) {
   (folder.older_ != nullptr ? folder.older_->newer_ : oldest_) = folder.newer_;
 }
 
-/// Forgets one folder that nothing known is in. The others at the end of the row go to its front, being in use.
+/// Drops the oldest folder without children. Those with children that come before it in the order count as used now.
+/// Gives up after some attempts: then the cache is a little larger for a while.
 void FolderCache::ForgetOldest(const Folder& keep) {
   constexpr int kAttempts = 64;
   for (int attempt = 0; attempt < kAttempts; ++attempt) {

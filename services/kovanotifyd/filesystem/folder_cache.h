@@ -10,23 +10,24 @@
 
 namespace ferrox::notifyd {
 
-/// Where folders are, by their keys: a tree of those that were lately asked for, with all that is above them. Keeps
-/// about `folders_max` of them, some 130 bytes each, and forgets those that were longest not asked for.
+/// The places of folders, by their keys: a tree of those that were asked for lately, with all folders above them. Keeps
+/// about `folders_max` folders of some 130 bytes, and drops those that were not asked for the longest (LRU).
 class FolderCache {
  public:
-  /// Marks that a key keeps, whether its folder is known or not.
+  /// Marks that a key keeps, whether its folder is in the cache or not.
   enum Mark : uint8_t { kRoot = 1, kQuiet = 2 };
 
   struct Folder {
     const HandleKey* key = nullptr;
-    Folder* parent = nullptr;  ///< null of what has nothing above it: the top of a mount, or a folder that is nowhere
+    Folder* parent =
+        nullptr;  ///< null for the top of a mount, and for a folder that is removed or outside of all mounts
     std::string name = {};
-    uint32_t children = 0;
+    uint32_t children = 0;  ///< in the cache; a folder that has some is not dropped
     uint8_t marks = 0;
 
    private:
     friend class FolderCache;
-    Folder* newer_ = nullptr;
+    Folder* newer_ = nullptr;  ///< neighbours in the order of use
     Folder* older_ = nullptr;
   };
 
@@ -34,13 +35,14 @@ class FolderCache {
   FolderCache(const FolderCache&) = delete;
   FolderCache& operator=(const FolderCache&) = delete;
 
-  /// The folder, or null when it is not known. Pointers hold until the next Put of another key, or Clear.
+  /// The folder, or null when it is not in the cache. Pointers are valid until the next Put of another key, or Clear.
   Folder* Find(const HandleKey& key);
-  /// Places a folder, new or known. Null, and nothing is changed, when `parent` is the folder itself or below it.
+  /// Sets the place of a folder, and adds it if need be. Null, and nothing changes, when `parent` is the folder itself
+  /// or below it.
   Folder* Put(const HandleKey& key, Folder* parent, std::string_view name);
-  /// Marks the key's folder; 0 for none.
+  /// Sets the marks of a key; 0 for none.
   void SetMarks(const HandleKey& key, uint8_t marks);
-  /// Forgets all folders, not the marks.
+  /// Drops all folders, not the marks.
   void Clear();
 
   size_t Size() const { return folders_.size(); }

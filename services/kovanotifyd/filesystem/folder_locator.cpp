@@ -6,7 +6,8 @@ namespace ferrox::notifyd {
 
 namespace {
 
-// More than a path of PATH_MAX bytes can have. Only records that contradict each other lead here.
+// Of the recursion: more folders than a path of PATH_MAX bytes can have. Only records that contradict each other would
+// lead deeper.
 constexpr int kDepthMax = 2100;
 
 }  // namespace
@@ -31,6 +32,8 @@ FolderCache::Folder* FolderLocator::LocateAnew(const HandleKey& key) {
   }
 }
 
+/// Asks the disk only if no record ahead has the answer, and the records again afterwards: one that came meanwhile may
+/// have moved the folder before the disk was read.
 FolderSource::Answer FolderLocator::PlaceOf(const HandleKey& key, FolderPlace& place) {
   FolderSource::Answer answer = FolderSource::Answer::kPlace;
   const FanRecord* moved = window_.NextRelocation(key);
@@ -50,7 +53,7 @@ FolderCache::Folder* FolderLocator::Place(const HandleKey& key, const FolderPlac
     if (parent == nullptr) return nullptr;
     FolderCache::Folder* folder = cache_.Put(key, parent, place.name);
     if (folder != nullptr) return folder;
-    // The folder would be inside of itself: the cache was led astray by changes that the kernel had joined.
+    // The folder would be inside of itself: records that the kernel had joined have made the cache wrong.
     cache_.Clear();
   }
   return nullptr;

@@ -7,45 +7,47 @@
 
 namespace ferrox::notifyd {
 
-/// In which folder another one is, and under which name.
+/// Where a folder is: the folder above it, and its name there.
 struct FolderPlace {
   HandleKey parent = {};
   std::string name = {};
 };
 
-/// The file system as it is at present, and the kernel's queue of what was done to it.
+/// The file system as it is at present, and the kernel's queue of records of what was done to it.
 class FolderSource {
  public:
   enum class Answer : uint8_t {
-    kPlace,    ///< it is there
-    kTop,      ///< it is the top of what is mounted
-    kNowhere,  ///< removed, or outside of what is mounted
-    kFailed,   ///< cannot be found out now
+    kPlace,    ///< the folder is at the place
+    kTop,      ///< it is the top of a mount
+    kNowhere,  ///< it is removed, or outside of all mounts
+    kFailed,   ///< that cannot be found out now
   };
 
   virtual ~FolderSource() = default;
 
-  /// Reads where the folder is at present. When it is moved or removed meanwhile, the answer may be made of both
-  /// states; but what had been done to it before the answer has been queued when this returns.
+  /// Reads where the folder is at present. If it is moved or removed meanwhile, the answer may be mixed from before and
+  /// after; but the records of all that was done to it before the answer are queued when this returns.
   virtual Answer ReadPlace(const HandleKey& folder, FolderPlace& place) = 0;
-  /// Moves all that is queued into the window.
+  /// Moves all queued records into the window.
   virtual void Drain(RecordWindow& window) = 0;
 };
 
-/// Tells where folders are at the moment of the record that is worked on, although the disk is ahead of it by as many
-/// moves as the reader is behind. What is known in the cache holds at that moment, since it is changed in the order of
-/// the records. Any other folder is, until the first record ahead that moves or removes it, at that record's old place;
-/// and without such a record, where the disk says: whatever had moved it before the disk was read would be ahead.
+/// Finds where folders were at the moment of the record that is worked on, although the disk is ahead of it by all the
+/// records that are still to be worked on. What is in the cache is right for that moment, since it is changed in the
+/// order of the records. For any other folder the records ahead are searched: until the first one that moves or removes
+/// it, the folder is at the old place in that record. Without such a record it is where the disk says, because a move
+/// that came before the disk was read would have a record ahead.
 class FolderLocator {
  public:
   FolderLocator(FolderCache& cache, RecordWindow& window, FolderSource& source)
       : cache_(cache), window_(window), source_(source) {}
 
-  /// The folder with all above it; null when that cannot be found out. As long-lived as FolderCache::Find's.
+  /// The folder with all folders above it, in the cache; null when its place cannot be found out. Valid as long as what
+  /// FolderCache::Find returns.
   FolderCache::Folder* Locate(const HandleKey& key);
-  /// The same, whatever the cache has for the folder itself.
+  /// The same, even if the cache has the folder.
   FolderCache::Folder* LocateAnew(const HandleKey& key);
-  /// Notes where the folder is from here on. Null when where that is cannot be found out.
+  /// Puts the folder at a place from this record on. Null when the folders above it cannot be located.
   FolderCache::Folder* Place(const HandleKey& key, const FolderPlace& place);
 
  private:
@@ -54,7 +56,7 @@ class FolderLocator {
   FolderCache& cache_;
   RecordWindow& window_;
   FolderSource& source_;
-  int depth_ = 0;
+  int depth_ = 0;  ///< of the recursion through the folders above
 };
 
 }  // namespace ferrox::notifyd

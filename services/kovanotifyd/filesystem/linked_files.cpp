@@ -22,12 +22,13 @@ void LinkedFiles::OnLinks(const HandleKey& file) {
 std::optional<uint64_t> LinkedFiles::NumberToReport(const FanRecord& record) {
   if (record.target.empty() || alone_.count(record.target) != 0) return 0;
   const bool is_new = (record.mask & FAN_CREATE) != 0 && !has_forgotten_ && linked_.count(record.target) == 0;
-  if (!is_new) return LookAt(record);
+  if (!is_new) return Examine(record);
   NoteAlone(record.target);
   return 0;
 }
 
-std::optional<uint64_t> LinkedFiles::LookAt(const FanRecord& record) {
+/// By the file's handle: its number of links, and whether the name in the record still leads to it.
+std::optional<uint64_t> LinkedFiles::Examine(const FanRecord& record) {
   const base::UniqueFd file = mounts_.Open(record.target, O_PATH | O_NOFOLLOW);
   struct stat status = {};
   if (!file.Valid() && (errno == ESTALE || errno == ENOENT)) return 0;

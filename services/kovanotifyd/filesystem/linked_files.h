@@ -13,34 +13,35 @@ namespace ferrox::notifyd {
 
 class MountedFolders;
 
-/// Finds out which changes of files have to be told of by the file's number, since the name of the record says nothing
-/// of them: the file has other names, or has lost that one since. All other files are looked at once, however often
-/// they are written to, and new ones not at all: the kernel tells when the number of a file's links changes, before it
-/// tells of the name that came.
+/// Finds out which changes of files have to be reported by the file's number, since its name in the record is not
+/// enough: the file has other names (hard links), or has lost that name since. Any other file is examined once, however
+/// often it is written to, and a new one not at all: the kernel reports that the number of a file's links changed
+/// before it reports the new name.
 class LinkedFiles {
  public:
   explicit LinkedFiles(MountedFolders& mounts) : mounts_(mounts) {}
 
-  /// A record says that the number of the file's links changed.
+  /// The number of the file's links changed, says a record.
   void OnLinks(const HandleKey& file);
-  /// The number of the file that the record tells a change of, when it has to be told; 0 when not. Nothing when that
-  /// cannot be found out.
+  /// The number of the file that the record is about, if its change has to be reported by it; 0 if not. Nothing when
+  /// that cannot be found out.
   std::optional<uint64_t> NumberToReport(const FanRecord& record);
-  /// Nothing is waiting in the kernel.
+  /// To be called when no records are waiting: a file that is created after that has no links that were reported
+  /// before.
   void Rest();
-  /// Records may have been lost.
+  /// To be called when records may have been lost.
   void Clear();
 
  private:
-  static constexpr size_t kFilesMax = 4096;
+  static constexpr size_t kFilesMax = 4096;  ///< in each set; bounds memory
 
   void NoteAlone(const HandleKey& file);
-  std::optional<uint64_t> LookAt(const FanRecord& record);
+  std::optional<uint64_t> Examine(const FanRecord& record);
 
   MountedFolders& mounts_;
-  std::unordered_set<HandleKey> alone_;   ///< files that had one name, that of their records
-  std::unordered_set<HandleKey> linked_;  ///< whose number of links changed since nothing was waiting,
-  bool has_forgotten_ = false;            ///< or not all of them
+  std::unordered_set<HandleKey> alone_;   ///< files that have one name, that in their records
+  std::unordered_set<HandleKey> linked_;  ///< files whose number of links changed since the last Rest
+  bool has_forgotten_ = false;            ///< whether linked_ lacks some of these
 };
 
 }  // namespace ferrox::notifyd

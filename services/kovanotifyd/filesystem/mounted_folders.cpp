@@ -18,6 +18,7 @@ namespace {
 
 constexpr int kOpenFolder = O_RDONLY | O_DIRECTORY | O_CLOEXEC;
 
+/// Whether a folder is the top of a mount, or removed.
 struct Standing {
   bool is_top = false;
   bool is_removed = false;
@@ -40,7 +41,7 @@ uint64_t MountOf(const std::string& path) {
   return figures.stx_mnt_id;
 }
 
-/// The highest folder above `path` that is on the same mount: what may be renamed below it is no matter.
+/// The highest folder above `path` on the same mount, whose path stays right whatever is renamed below it.
 std::string TopOfMount(std::string path) {
   const uint64_t mount = MountOf(path);
   while (mount != 0 && path != "/") {
@@ -51,7 +52,7 @@ std::string TopOfMount(std::string path) {
   return path;
 }
 
-/// The last name of the folder's path. "" with errno set, also for a path that is longer than PATH_MAX.
+/// The last name in the folder's path, as the kernel tells it. "" with errno set, also for a path beyond PATH_MAX.
 std::string NameOf(int folder) {
   char link[32];
   (void)snprintf(link, sizeof link, "/proc/self/fd/%d", folder);
@@ -62,13 +63,14 @@ std::string NameOf(int folder) {
   return std::string(text.substr(text.rfind('/') + 1));
 }
 
+/// Without a change of its access time, where that is permitted.
 base::UniqueFd OpenAbove(int folder) {
   base::UniqueFd above(openat(folder, "..", kOpenFolder | O_NOATIME));
   return above.Valid() || errno != EPERM ? std::move(above) : base::UniqueFd(openat(folder, "..", kOpenFolder));
 }
 
-/// Returns when whoever was just changing names in the folder has done so and the kernel has queued the records: both
-/// happen under the folder's lock, which reading it takes too. That nothing fits into the buffer is no matter.
+/// Returns when changes of names in the folder that were under way are done and their records queued: the kernel does
+/// both under the folder's lock, which reading the folder takes too. The read itself may fail: its buffer is too small.
 void WaitForChangesUnderWay(int folder) {
   char entry[8];
   (void)syscall(SYS_getdents64, folder, entry, sizeof entry);
@@ -105,7 +107,7 @@ void MountedFolders::Close() {
   for (Anchor& anchor : anchors_) anchor.fd.Reset();
 }
 
-/// Something else may be mounted at the path, or nothing any more.
+/// Opens the mount unless it is open. False when something else is mounted at its path now, or nothing.
 bool MountedFolders::IsOpen(Anchor& anchor) {
   if (anchor.fd.Valid()) return true;
   base::UniqueFd fd(open(anchor.path.c_str(), kOpenFolder));
@@ -123,7 +125,7 @@ base::UniqueFd MountedFolders::Open(const HandleKey& folder, int flags) {
   return base::UniqueFd();
 }
 
-/// Of what one mount does not show, or shows as its top, another may show what is above.
+/// A file system may have several mounts: what is outside of one, or its top, may be below a folder of another.
 FolderSource::Answer MountedFolders::ReadPlace(const HandleKey& folder, FolderPlace& place) {
   FolderSource::Answer answer = FolderSource::Answer::kNowhere;
   for (Anchor& anchor : anchors_) {
@@ -150,7 +152,7 @@ FolderSource::Answer MountedFolders::ReadPlaceBy(int mount, const HandleKey& fol
   place.name = NameOf(fd.Get());
   if (place.parent.empty() || place.name.empty()) return failure();
   WaitForChangesUnderWay(above.Get());
-  // Asked last, since the name of what is removed has an ending of the kernel's.
+  // Asked last: of a removed folder, the kernel adds " (deleted)" to the name.
   if (!ReadStanding(fd.Get(), standing)) return failure();
   if (standing.is_removed || place.parent == folder) return FolderSource::Answer::kNowhere;
   return FolderSource::Answer::kPlace;

@@ -9,33 +9,34 @@
 
 namespace ferrox::notifyd {
 
-/// The records that were read and not yet worked through, in their order, and which folders they move or remove.
+/// The records that were read and are not yet worked on, in their order, with an index of those that move or remove
+/// folders.
 class RecordWindow {
  public:
   RecordWindow() = default;
   RecordWindow(const RecordWindow&) = delete;
   RecordWindow& operator=(const RecordWindow&) = delete;
 
-  /// Adds records behind the others.
+  /// Appends records.
   void Add(FanBatch batch);
   bool IsEmpty() const { return size_ == 0; }
   size_t Size() const { return size_; }
-  /// The first record; stays where it is until Pop, whatever is added.
+  /// The first record. The reference is valid until Pop or Clear, whatever is added.
   const FanRecord& Front() const { return batches_.front().records[at_]; }
   void Pop();
   void Clear();
 
-  /// The first record that moves the folder away from a place or removes it from there, which is where it is until
-  /// then; null without.
+  /// The first record that moves or removes the folder, whose old place is where the folder is until then; null when
+  /// there is none.
   const FanRecord* NextRelocation(const HandleKey& folder) const;
 
  private:
   static bool IsRelocation(const FanRecord& record);
 
   std::deque<FanBatch> batches_;
-  size_t at_ = 0;
-  size_t size_ = 0;
-  std::unordered_map<HandleKey, std::list<const FanRecord*>> relocations_;
+  size_t at_ = 0;    ///< the first record's index in the first batch
+  size_t size_ = 0;  ///< records in all batches from there on
+  std::unordered_map<HandleKey, std::list<const FanRecord*>> relocations_;  ///< by folder, in order
 };
 
 }  // namespace ferrox::notifyd

@@ -7,6 +7,7 @@ namespace ferrox::notifyd {
 
 namespace {
 
+/// A place as one string: the length of the folder's key in one byte, the key, the name.
 std::string Encode(const HandleKey& folder, std::string_view name) {
   std::string place(1, static_cast<char>(folder.size()));
   return place.append(folder).append(name);

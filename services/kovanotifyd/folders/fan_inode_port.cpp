@@ -24,7 +24,8 @@ uint64_t MaskOf(FolderPort::Wanted wanted) {
   return wanted == FolderPort::Wanted::kPlace ? kPlaceMask : FAN_ATTRIB | FAN_EVENT_ON_CHILD;
 }
 
-/// 64 bits of the handle's hash: of a million folders, two would have the same once in 40 million hosts.
+/// A 64-bit hash (FNV-1a with an extra shift) of the handle, never 0. Among a million folders, two have the same one on
+/// one of some 40 million hosts.
 FolderKey Shorten(const HandleKey& handle) {
   if (handle.empty()) return 0;
   uint64_t hash = 0xCBF29CE484222325U;
@@ -35,7 +36,7 @@ FolderKey Shorten(const HandleKey& handle) {
   return hash == 0 ? 1 : hash;
 }
 
-/// The changes that the kernel has joined in one record, in the order in which most of them come.
+/// Adds the changes that the kernel joined in one record, in the order in which they mostly happen.
 void AddRecords(const FanRecord& record, uint64_t file, std::vector<FolderRecord>& records) {
   constexpr uint64_t kBoth = FAN_CREATE | FAN_DELETE;
   constexpr struct {
@@ -74,14 +75,15 @@ int FanInodePort::Watch(int folder, Wanted wanted, FolderKey& key) {
   return group_.Mark(folder, kScope, MaskOf(wanted));
 }
 
-/// Opening files by their handles takes rights that this port does without; but a folder's number is known.
+/// Learns where handles have the inode number from a folder, whose number is known: opening a file by its handle to see
+/// its number would take privileges that this port does without.
 void FanInodePort::LearnNumbers(int folder, const HandleKey& handle) {
   const std::string form = FanGroup::FormOf(handle);
   const auto known = number_places_.find(form);
   if (known != number_places_.end() && known->second.size == 0) return;
   struct stat status = {};
   if (fstat(folder, &status) != 0) return;
-  // One that is found wrong was right by chance: what stands behind the number may be 0.
+  // A place that is wrong for another folder was right by chance, such as 8 bytes of which the last 4 were 0.
   const bool is_right = known != number_places_.end() && FanGroup::NumberIn(handle, known->second) == status.st_ino;
   if (!is_right) number_places_[form] = FanGroup::FindNumber(handle, status.st_ino);
 }

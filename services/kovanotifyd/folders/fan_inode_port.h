@@ -9,7 +9,8 @@
 
 namespace ferrox::notifyd {
 
-/// A mark of fanotify for each folder: what needs no privileges.
+/// Watches folders by marks of fanotify on their inodes, which needs no privileges. A folder's key is a hash of its
+/// file handle.
 class FanInodePort : public FolderPort {
  public:
   /// `group` is open and has no marks.
@@ -28,7 +29,8 @@ class FanInodePort : public FolderPort {
   void LearnNumbers(int folder, const HandleKey& handle);
 
   FanGroup group_;
-  /// Where handles have the file's number, by their form; as few as there are kinds of file systems.
+  /// Where handles have the file's inode number, by FanGroup::FormOf; as few entries as there are kinds of file
+  /// systems.
   std::map<std::string, FanGroup::NumberPlace> number_places_;
   FanBatch batch_;
 };

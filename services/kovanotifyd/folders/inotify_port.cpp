@@ -18,9 +18,9 @@ namespace {
 using Kind = FolderRecord::Kind;
 
 constexpr size_t kBatchBytes = 256 * 1024;
-/// Read at once at most, and only where moves are cut by the end of a batch.
+/// That one Read may join, which it does while a move has its first half in the last one and its second half not yet.
 constexpr size_t kBatches = 4;
-/// For the second half of a move of which only the first has been read.
+/// How long to wait for that second half. There may be none: the folder was moved out of what is watched.
 constexpr int kMoveWaitMs = 10;
 constexpr const char* kLimitFile = "/proc/sys/fs/inotify/max_user_watches";
 
@@ -41,7 +41,7 @@ uint32_t MaskOf(FolderPort::Wanted wanted) {
 
 FolderKey KeyOf(const inotify_event& event) { return event.wd > 0 ? static_cast<FolderKey>(event.wd) : 0; }
 
-/// False where the event says nothing that is not said otherwise too.
+/// False for an event that adds nothing to others, such as IN_DELETE_SELF, which IN_IGNORED follows.
 bool KindOf(const inotify_event& event, Kind& kind) {
   constexpr struct {
     uint32_t bit;
@@ -72,14 +72,14 @@ std::vector<const inotify_event*> EventsIn(const char* buffer, size_t size) {
   return events;
 }
 
-/// By cookie: the halves of moves that lead to watched folders, and whether the other half was met before.
+/// The second half of a move, which leads to a watched folder, and whether its first half was found.
 struct Arrival {
   const inotify_event* event;
   bool paired = false;
 };
-using Arrivals = std::unordered_map<uint32_t, Arrival>;
+using Arrivals = std::unordered_map<uint32_t, Arrival>;  ///< by the kernel's cookie of the move
 
-/// Finds those from the event `first` on; whether each move that began there has its other half.
+/// Adds those from the event `first` on. Returns whether each move that begins there has both halves.
 bool PairMoves(const std::vector<const inotify_event*>& events, size_t first, Arrivals& arrivals) {
   for (size_t i = first; i < events.size(); ++i) {
     if ((events[i]->mask & IN_MOVED_TO) != 0) arrivals.emplace(events[i]->cookie, Arrival{events[i]});
@@ -90,7 +90,7 @@ bool PairMoves(const std::vector<const inotify_event*>& events, size_t first, Ar
   return true;
 }
 
-/// A move is told where it began: what came between its halves was done to the folder in its new place.
+/// A move is reported in the place of its first half: events between the halves concern the folder in its new place.
 void AddRecord(const inotify_event& event, Arrivals& arrivals, std::vector<FolderRecord>& records) {
   Kind kind{};
   if (!KindOf(event, kind)) return;
@@ -139,7 +139,7 @@ void InotifyPort::Unwatch(FolderKey key, const std::string& /*path*/) {
                          static_cast<int>(key));  // fails where the folder is gone and the watch with it
 }
 
-/// Adds what there is to the buffer, about as much as a batch has.
+/// Appends a batch to the buffer; false when nothing was waiting.
 bool InotifyPort::Fill() {
   if (!buffer_) buffer_.reset(new char[kBatches * kBatchBytes]);  // not cleared: only what is used is in memory
   const ssize_t size = read(inotify_.Get(), buffer_.get() + filled_, kBatchBytes);

@@ -9,10 +9,10 @@
 
 namespace ferrox::notifyd {
 
-/// A watch of inotify for each folder.
+/// Watches folders by inotify. Its records name both sides of a move in two halves, which are put together here.
 class InotifyPort : public FolderPort {
  public:
-  /// "" or why there is no inotify, without a full stop and with the remedy.
+  /// @return "", or why inotify is not available, with the remedy and without a full stop.
   std::string Open();
 
   const char* Name() const override { return "inotify"; }
@@ -28,8 +28,8 @@ class InotifyPort : public FolderPort {
   bool Fill();
 
   base::UniqueFd inotify_;
-  std::unique_ptr<char[]> buffer_;
-  size_t filled_ = 0;
+  std::unique_ptr<char[]> buffer_;  ///< the names in the records of the last Read point into it
+  size_t filled_ = 0;               ///< bytes of it
 };
 
 }  // namespace ferrox::notifyd
