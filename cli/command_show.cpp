@@ -176,7 +176,8 @@ Json::Value StatusOfIndexDaemon() try {
 /// Folders of the share that are no part of its index, unless another share has them. Nothing when no daemon tells.
 uint64_t ListLeftOut(const Json::Value& daemon, const std::string& share, bool json) {
   uint64_t count = 0;
-  for (const Json::Value& folder : ShareIn(daemon, share)["left_out"]) {
+  const Json::Value entry = ShareIn(daemon, share);
+  for (const Json::Value& folder : entry["left_out"]) {
     if (folder.isMember("share")) continue;
     ++count;
     if (json) {
