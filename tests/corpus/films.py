@@ -1,7 +1,4 @@
-"""Films in all containers: real ones, some with texts in several languages added.
-
-Size and length are what exiftool says, or what a film is made with here.
-"""
+"""Films in many containers, with texts in several languages added. Those as they are found elsewhere are listed."""
 
 import shutil
 import struct
@@ -19,54 +16,12 @@ TEXTS = {
     "polish": ("Wakacje nad jeziorem", "Łucja Ślązak", "Rodzinny", "żeglowanie o świcie"),
 }
 
-# Whose, name, extension here, MIME type.
-AS_THEY_ARE = [
-    (MIMETYPE, "3gp.3gp", "3gp", "video/3gpp"), (MIMETYPE, "asf.asf", "asf", "video/x-ms-wmv"),
-    (MIMETYPE, "flv.flv", "flv", "video/x-flv"), (MIMETYPE, "mkv.mkv", "mkv", "video/x-matroska"),
-    (MIMETYPE, "mov.mov", "mov", "video/quicktime"), (MIMETYPE, "mp4.mp4", "mp4", "video/mp4"),
-    (MIMETYPE, "ogg.ogv", "ogv", "video/ogg"),
-    (MIMETYPE, "webm.webm", "webm", "video/webm"), ("taglib", "no-tags.3g2", "3g2", "video/3gpp"),
-    ("taglib", "blank_video.m4v", "m4v", "video/mp4"), ("exiftool", "RIFF.avi", "avi", "video/x-msvideo"),
-    ("exiftool", "Pentax.avi", "avi", "video/x-msvideo"), ("exiftool", "QuickTime.mov", "mov", "video/quicktime"),
-    ("exiftool", "Matroska.mkv", "mkv", "video/x-matroska"), ("exiftool", "DV.dv", "dv", "video/x-dv"),
-]
-# What exiftool does not say, or says of another part of the file: ffprobe does.
-CORRECTED = {
-    "3gp.3gp": {"KOVAMDAudioChannelCount": 1},
-    "no-tags.3g2": {"KOVAMDDurationSecond": tools.near(16.3, 0.05), "KOVAMDAudioChannelCount": 1},
-    "asf.asf": {"KOVAMDDurationSecond": tools.near(4.4, 0.05)},
-    "ogg.ogv": {"KOVAMDDurationSecond": None},
-    "DV.dv": {"KOVAMDDurationSecond": None, "KOVAMDAudioChannelCount": None},
-    "RIFF.avi": {"KOVAMDContentCreationDate": tools.seconds_of("2003:03:10 15:04:43")},
-    "Pentax.avi": {"KOVAMDContentCreationDate": tools.seconds_of("2009:10:27 12:14:34")},
-}
-
-
 def donor(corpus, package, name):
     if package == "exiftool":
         return tools.sample(corpus, name)
     if package == "taglib":
         return corpus.source_donor("taglib", f"tests/data/{name}")
     return corpus.donor(MIMETYPE, f"usr/share/gocode/src/github.com/gabriel-vasile/mimetype/testdata/{name}")
-
-
-def fields_of(said, name):
-    fields = {}
-    for tag, field, share in (("ImageWidth", "PixelWidth", 0), ("ImageHeight", "PixelHeight", 0),
-                              ("Duration", "DurationSecond", 0.05), ("AudioSampleRate", "AudioSampleRate", 0.001),
-                              ("AudioChannels", "AudioChannelCount", 0)):
-        if isinstance(said.get(tag), (int, float)) and said[tag] > 0:
-            fields["KOVAMD" + field] = tools.near(said[tag], share) if share else said[tag]
-    fields.update(CORRECTED.get(name, {}))
-    return {field: value for field, value in fields.items() if value is not None}
-
-
-def add_as_they_are(corpus):
-    paths = [donor(corpus, package, name) for package, name, _, _ in AS_THEY_ARE]
-    said = tools.examine(corpus, paths)
-    for path, (package, name, extension, mime) in zip(paths, AS_THEY_ARE):
-        target = f"{extension}/of_{package.split('-')[0]}_{name}"
-        corpus.add(target, path, fields=fields_of(said[path], name), mime=mime)
 
 
 def add_by_mutagen(corpus, work):
@@ -164,7 +119,6 @@ def add_flash_and_avi(corpus):
 
 
 def make(corpus):
-    add_as_they_are(corpus)
     with tempfile.TemporaryDirectory() as work:
         add_by_mutagen(corpus, work)
         add_of_phones(corpus, work)

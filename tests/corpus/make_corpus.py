@@ -2,8 +2,8 @@
 """Makes the corpus, FOLDER/files, and what must be found in it, FOLDER/expected.json.
 
 Each subject is a module beside this one with a function make(corpus), and with a list DONORS of the packages that it
-takes files out of: films, photos and sound, which get texts in several languages and numbers that other programs tell, and
-listed, for all that is a file and what is known of it.
+takes files out of: films, photos and sound, whose files get texts in several languages, and listed, for all that is a file
+elsewhere and what is known of it.
 """
 
 import argparse

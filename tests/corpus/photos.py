@@ -1,7 +1,6 @@
 """Pictures: what cameras, and then people, put into them.
 
-Of files as cameras and programs made them, exiftool says what must be found; to others it adds texts in several
-languages.
+exiftool adds texts in several languages to pictures of every format. Those as cameras and programs made them are listed.
 """
 
 import struct
@@ -10,38 +9,10 @@ import zlib
 
 import tools
 
-GO_IMAGE, GO_EXIF = "golang-golang-x-image-dev", "golang-github-rwcarlsen-goexif-dev"
-MIMETYPE = "golang-github-gabriel-vasile-mimetype-dev"
-DONORS = [GO_IMAGE, GO_EXIF, MIMETYPE]
+GO_IMAGE, MIMETYPE = "golang-golang-x-image-dev", "golang-github-gabriel-vasile-mimetype-dev"
+DONORS = [GO_IMAGE, MIMETYPE]
 SAMPLES = {GO_IMAGE: "usr/share/gocode/src/golang.org/x/image/testdata",
-           GO_EXIF: "usr/share/gocode/src/github.com/rwcarlsen/goexif/exif",
            MIMETYPE: "usr/share/gocode/src/github.com/gabriel-vasile/mimetype/testdata"}
-
-RAW = "image/x-raw"
-TYPES = {"jpg": "image/jpeg", "tif": "image/tiff", "png": "image/png", "webp": "image/webp", "heic": "image/heic",
-         "avif": "image/avif", "psd": "image/vnd.adobe.photoshop", "gif": "image/gif", "bmp": "image/bmp",
-         "jp2": "image/jp2"}
-
-# Cameras by their makers' samples; each line is a format.
-CAMERAS = """
-Apple.jpg Canon.jpg Canon1DmkIII.jpg Casio.jpg Casio2.jpg FujiFilm.jpg GE.jpg GoPro.jpg JVC.jpg Minolta.jpg Motorola.jpg
-Nikon.jpg NikonD2Hs.jpg NikonD70.jpg Olympus.jpg Olympus2.jpg OlympusE1.jpg Panasonic.jpg Ricoh.jpg Ricoh2.jpg Sanyo.jpg
-Sigma.jpg Sony.jpg GPS.jpg
-CanonRaw.cr2 CanonRaw.cr3 CanonRaw.crw DNG.dng FujiFilm.raf Minolta.mrw Nikon.nef Panasonic.rw2 PhaseOne.iiq
-ExifTool.tif GeoTiff.tif PNG.png RIFF.webp QuickTime.heic Photoshop.psd GIF.gif BMP.bmp Jpeg2000.jp2
-""".split()
-# Cut off behind what the camera wrote: all of that is found, and that something is missing is said.
-CUT = {"CanonRaw.cr3": "damaged"}
-
-PLAIN = [
-    (GO_IMAGE, "go-turns-two-280x360.jpeg", "jpg"), (GO_IMAGE, "blue-purple-pink.lzwcompressed.tiff", "tif"),
-    (GO_IMAGE, "bw-gopher_ccittGroup4.tiff", "tif"), (GO_IMAGE, "video-001-tile-64x64.tiff", "tif"),
-    (GO_IMAGE, "go-turns-two-rotate-nn.png", "png"), (GO_IMAGE, "gopher-doc.4bpp.png", "png"),
-    (GO_IMAGE, "blue-purple-pink.lossy.webp", "webp"), (GO_IMAGE, "gopher-doc.8bpp.lossless.webp", "webp"),
-    (GO_IMAGE, "colormap.bmp", "bmp"), (GO_IMAGE, "video-001.bmp", "bmp"), (GO_EXIF, "sample1.jpg", "jpg"),
-    (GO_EXIF, "samples/has-lens-info.jpg", "jpg"), (GO_EXIF, "samples/f6-exif.jpg", "jpg"),
-    (MIMETYPE, "avif.avif", "avif"), (MIMETYPE, "psd.psd", "psd"), (MIMETYPE, "apng.png", "png"),
-]
 
 # Of a language: title, description, keywords, author, city, country, people.
 TEXTS = {
@@ -61,39 +32,6 @@ BASES = {
 
 def donor(corpus, package, name):
     return corpus.donor(package, f"{SAMPLES[package]}/{name}")
-
-
-def fields_of(said, extension):
-    """The fields that must be found, of what exiftool says. Sizes of raw files are told in many ways."""
-    fields = {}
-    for tag, field in (("Make", "AcquisitionMake"), ("Model", "AcquisitionModel")):
-        if str(said.get(tag, "")).strip():
-            fields["KOVAMD" + field] = str(said[tag]).strip()
-    numbers = (("FNumber", "FNumber"), ("ExposureTime", "ExposureTimeSeconds"), ("FocalLength", "FocalLength"))
-    for tag, field in numbers:
-        if isinstance(said.get(tag), (int, float)) and said[tag] > 0 and extension != "crw":
-            fields["KOVAMD" + field] = tools.near(said[tag])
-    if isinstance(said.get("ISO"), int) and said["ISO"] > 10 and extension != "crw":
-        fields["KOVAMDISOSpeed"] = said["ISO"]
-    if isinstance(said.get("Orientation"), int):
-        fields["KOVAMDOrientation"] = said["Orientation"]
-    taken = tools.seconds_of(said.get("DateTimeOriginal", ""), said.get("OffsetTimeOriginal", ""))
-    if taken is not None:
-        fields["KOVAMDContentCreationDate"] = taken
-    if extension in TYPES:
-        fields["KOVAMDPixelWidth"], fields["KOVAMDPixelHeight"] = said["ImageWidth"], said["ImageHeight"]
-    return fields
-
-
-def add_as_they_are(corpus):
-    rows = [(tools.sample(corpus, name), name.rsplit(".", 1)[1], CUT.get(name)) for name in CAMERAS]
-    rows += [(donor(corpus, package, name), extension, None) for package, name, extension in PLAIN]
-    rows.append((corpus.source_donor("libheif", "examples/example.heic"), "heic", None))
-    rows.append((corpus.source_donor("libheif", "examples/example.avif"), "avif", None))
-    said = tools.examine(corpus, [path for path, _, _ in rows])
-    for number, (path, extension, error) in enumerate(rows):
-        corpus.add(f"{extension}/as_made_{number}.{extension}", path, fields=fields_of(said[path], extension),
-                   mime=TYPES.get(extension, RAW), error=error)
 
 
 def tags_of(texts):
@@ -195,7 +133,6 @@ def add_png_texts(corpus):
 
 
 def make(corpus):
-    add_as_they_are(corpus)
     add_with_texts(corpus)
     add_webp_with_texts(corpus)
     add_older_texts(corpus)

@@ -1,10 +1,8 @@
 """Programs that say what is in a file, or write it there, without being installed: exiftool and mutagen."""
 
-import calendar
 import importlib
 import json
 import os
-import re
 import subprocess
 import sys
 import tempfile
@@ -59,13 +57,3 @@ def mutagen(corpus, module=None):
 def near(value, share=0.02):
     """A number that programs may round as they like."""
     return {"min": value * (1 - share) - 1e-9, "max": value * (1 + share) + 1e-9}
-
-
-def seconds_of(time, zone=""):
-    """Of exiftool's "2005:08:03 18:59:18", with "+02:00" or nothing behind it; None when it is no time."""
-    found = re.match(r"(\d{4}):(\d\d):(\d\d) (\d\d):(\d\d):(\d\d)(?:\.\d+)?(?:([-+])(\d\d):(\d\d))?", str(time) + zone)
-    if not found:
-        return None
-    sign, hours, minutes = found.group(7), int(found.group(8) or 0), int(found.group(9) or 0)
-    ahead = (hours * 3600 + minutes * 60) * (-1 if sign == "-" else 1)
-    return calendar.timegm(tuple(int(part) for part in found.groups()[:6])) - ahead
