@@ -38,6 +38,7 @@ long long DeadlineAfter(int hours) {
   return static_cast<int32_t>(deadline);
 }
 
+/// The share's bits as a number without a sign, for masking; 0 when it has none, or no number.
 unsigned int OldBits(const Json::Value& data, const std::string& share) {
   Json::Value shares;
   unsigned int bits = 0;

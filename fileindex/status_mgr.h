@@ -13,7 +13,9 @@ namespace ferrox::fileindex {
 /// that change at the same moment may lose one change, so keep an object's life short.
 class FERROX_EXPORT StatusMgr {
  public:
-  /// Status bits of a share.
+  /// Status bits of a share. kNeedReindex: the index may lack changes, because an event could not be queued or the
+  /// volume was full; the index daemon compares the share as a whole and then takes the bit away. kSecondCondition: the
+  /// index itself must be made anew, which FolderReindex does.
   enum ShareStatus : int { kNeedReindex = 1, kSecondCondition = 2 };
 
   /// Loads the file; a missing one counts as empty. @throws Error kLoadFailed "Cannot load json: <path>".
@@ -26,6 +28,7 @@ class FERROX_EXPORT StatusMgr {
 
   /// Each change below takes the status lock (at most about 58 s) and saves.
   /// @throws Error kLockFailed; kSaveFailed; kInternal when the file's mode cannot be set; kCredentialsFailed.
+  /// The first two set and take away the given bits and leave the share's others; the last drops all the share's bits.
   void SetShareStatus(const std::string& share, int bits);
   void UnsetShareStatus(const std::string& share, int bits);
   void ClearShareStatus(const std::string& share);
@@ -40,7 +43,7 @@ class FERROX_EXPORT StatusMgr {
   void Save();
 
  private:
-  Json::Value data_;
+  Json::Value data_;  ///< the whole document; members that other programs put there are kept
 };
 
 }  // namespace ferrox::fileindex

@@ -15,11 +15,13 @@ namespace ferrox::fileindex {
 
 namespace {
 
+/// The sizes of the platform's buffers, the terminating zero included.
 constexpr size_t kShareNameBytes = 492;
 constexpr size_t kPathBytes = 4096;
 constexpr int kEveryKindOfUser = 11;
 constexpr int kNeverIndexedFS = KOVA_FS_PSEUDO;
 
+/// Names beside those that the platform itself hides: what programs of the platform and other systems leave on a share.
 const std::vector<std::string>& SystemPreservedNames() {
   static const std::vector<std::string> names = {".TemporaryItems", ".KOVAPPSDB", ".DS_Store"};
   return names;
@@ -27,6 +29,7 @@ const std::vector<std::string>& SystemPreservedNames() {
 
 bool Contains(const std::string& text, const char* part) { return text.find(part) != std::string::npos; }
 
+/// The platform is asked only where the name of a snapshot folder stands in the path, which is cheap to see.
 bool IsInSnapshot(const std::string& full_path) {
   int in_snapshot = 0;
   return Contains(full_path, "#snapshot") && KLIBFhsPathInSnapshot(full_path.c_str(), &in_snapshot) == 0 &&
@@ -38,6 +41,7 @@ bool IsOnIndexableFS(const std::string& full_path) {
   return type >= 0 && KOVAFSIsRemoteFS(type) == 0 && KOVAFSIsImageFS(type) == 0 && type != kNeverIndexedFS;
 }
 
+/// Whether something other than the share's own file system is mounted at the path.
 bool IsForeignMountPoint(const std::string& full_path, const sdk::SDKShare& share) {
   // An encrypted share is a mount of its own.
   return KOVAFSDirIsMntPoint(full_path.c_str()) == 1 && !share.IsEncryption();

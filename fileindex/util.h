@@ -14,20 +14,24 @@
 /// same file is absolute ("/volume1/photo/a.jpg").
 namespace ferrox::fileindex {
 
+/// Published here once, and so still to be had under this name; they are those of common/file_util.h.
 using ferrox::Basename;
 using ferrox::Dirname;
 using ferrox::GetFileExtension;
 using ferrox::StringStartWith;
 
-/// 7 makes the library log every queue line that it reads; any other value does not.
+/// 7 makes the library log every queue line that it reads; any other value does not. For the whole process; set it
+/// before threads read queues.
 extern FERROX_EXPORT int log_level;
 
+/// The kind of a file. The first four are those whose content a folder has indexed or not; the values are also their
+/// order in stored folders.
 enum FileType : int32_t {
   FILE_TYPE_DOCUMENT = 0,  ///< documents, text, source code, archives, e-books, mail
-  FILE_TYPE_AUDIO = 1,
-  FILE_TYPE_VIDEO = 2,  ///< also disc images
-  FILE_TYPE_IMAGE = 3,
-  FILE_TYPE_OTHER = 4,  ///< any extension that is not in the table
+  FILE_TYPE_AUDIO = 1,     ///< also playlists
+  FILE_TYPE_VIDEO = 2,     ///< also disc images
+  FILE_TYPE_IMAGE = 3,     ///< the kind "photo" of a folder
+  FILE_TYPE_OTHER = 4,     ///< any extension that is not in the table
 };
 
 /// The share's name: the first component of a share path.
@@ -35,11 +39,13 @@ enum FileType : int32_t {
 FERROX_EXPORT void GetShareNameByPath(std::string& share_name, const std::string& share_path);
 FERROX_EXPORT std::string GetShareNameByPath(const std::string& share_path);
 
-/// The full path of a share path. @throws Error kBadArgument as above; kNoSuchShare.
+/// The full path of a share path: what the share's own folder lies in, and the share path behind it. Nothing need be
+/// there besides the share. Asks the platform each time. @throws Error kBadArgument as above; kNoSuchShare.
 FERROX_EXPORT void GetFullPath(std::string& full_path, const std::string& share_path);
 FERROX_EXPORT std::string GetFullPath(const std::string& share_path);
 
-/// The share that a full path lies in, and its share path.
+/// The share that a full path lies in, and its share path. Of shares that lie in each other the platform gives the
+/// deepest. Takes the platform's mutex.
 /// @throws Error kInternal "KOVAShareNamePathGet failed, full_path=...".
 FERROX_EXPORT void GetShareNamePathByFullPath(std::string& share_name, std::string& share_path,
                                               const std::string& full_path);
@@ -49,7 +55,8 @@ FERROX_EXPORT void GetShareNamePathByFullPath(std::string& share_name, std::stri
 FERROX_EXPORT std::string ReplacePathShare(const std::string& path, const std::string& new_share,
                                            const std::string& old_share);
 
-/// The kind of a file by its extension in lower case; no extension is a document.
+/// The kind of a file by its extension, whatever its case; a name without one is a document. Goes by the text alone:
+/// nothing need be there, and a folder's name counts likewise.
 FERROX_EXPORT FileType GetFileTypeByFullPath(const std::string& path);
 
 /// The query strings of the four kinds: "document", "audio", "video", "image" to extensions joined with " OR ".
@@ -65,7 +72,8 @@ FERROX_EXPORT bool CanFullPathBeIndexed(const std::string& full_path);
 /// The same for a share path.
 FERROX_EXPORT bool CanPathBeIndexed(const std::string& share_path);
 
-/// Whether a file of this name belongs to a system, not to a user.
+/// Whether a file or folder of this name, given without its folder, belongs to a system and not to a user: what the
+/// platform hides, and what other systems leave behind (".DS_Store"). Neither it nor anything below it is indexed.
 FERROX_EXPORT bool IsSystemPreservedFileName(const std::string& file_name);
 
 /// Fields of the kernel's memory report.
@@ -75,7 +83,8 @@ inline constexpr char kCached[] = "Cached";
 inline constexpr char kSwapTotal[] = "SwapTotal";
 inline constexpr char kSwapFree[] = "SwapFree";
 
-/// Tell the administrators that the index volume is full, or that the system lacks memory. Failures are ignored.
+/// Notify the administrators that the index volume is full, or that the system lacks memory, through the platform's
+/// notifier; each waits until that program has ended. Failures are ignored.
 FERROX_EXPORT void SendZEMNotify();
 FERROX_EXPORT void NotifyLackOfMemory();
 

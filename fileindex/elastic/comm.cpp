@@ -22,8 +22,10 @@ namespace ferrox::fileindex::elastic {
 
 namespace {
 
+/// The engine may be about to start: its socket is looked for 16 times, a second apart.
 constexpr int kSocketChecks = 16;
 constexpr std::chrono::milliseconds kSocketPause{1000};
+/// After this many refusals the administrators are notified: about three hours of an engine without memory or space.
 constexpr unsigned int kRetriesBeforeNotice = 11;
 constexpr char kUnusableReply[] =
     "!conn.Recv(resp_raw) || !res.fromString(resp_raw) || !res.isMember(\"success\") || !res[\"success\"].isBool()";
@@ -37,6 +39,8 @@ T Member(const Json::Value& object, const char* key, T absent = {}) {
   return absent;
 }
 
+/// Returns when there is a file at the socket's path, or after the last check. Whether anybody serves it, connecting
+/// tells.
 void WaitForSocket(const std::string& path) {
   for (int check = 1; check <= kSocketChecks; ++check) {
     if (access(path.c_str(), F_OK) == 0 || check == kSocketChecks) return;
@@ -45,12 +49,14 @@ void WaitForSocket(const std::string& path) {
   }
 }
 
+/// Whether a whole reply came that says whether the request succeeded.
 bool ReceiveReply(Json::Value& res, kovadaemon::SockConnection& conn) {
   std::string text;
   return conn.Recv(text) && fromString(res, text) && res.isObject() && res.isMember("success") &&
          res["success"].isBool();
 }
 
+/// @throws SubjectError with the engine's code and sentence; Error kBadArgument when its reply lacks one of them.
 void ThrowIfFailed(const Json::Value& res) {
   if (res["success"].asBool()) return;
   int code = 0;
@@ -85,6 +91,7 @@ void CheckParts(const Json::Value& parts, const Json::Value& results) {
   }
 }
 
+/// Names the command and its index, not the documents, which may be many.
 void LogBusy(unsigned int retry, const Json::Value& req) {
   Log(LOG_ERR, "%s:%d Retry[%u] since kovaelasticd is busy. Command: %s, db: %s", ModuleName(FERROX_SOURCE).c_str(),
       __LINE__, retry, Member<std::string>(req, "command").c_str(),

@@ -19,6 +19,8 @@ namespace ferrox::fileindex::elastic {
 
 namespace {
 
+/// Whether the content extraction gave a document. What a reader throws, of whatever type, makes the file one that
+/// cannot be read; only the cancelling of a thread goes on.
 bool ParseFile(const std::string& path, const Json::Value& config, Json::Value& document) {
   try {
     KOVA::CONTENT_EXTRACT::ParseFile(path, config, document);
@@ -30,6 +32,8 @@ bool ParseFile(const std::string& path, const Json::Value& config, Json::Value& 
   }
 }
 
+/// The document of a file as it is stored: what the extraction gave, and the name once more in the field that searches
+/// for names go through.
 Json::Value BuildDocument(const std::string& path, bool need_meta) {
   Json::Value config(Json::objectValue);
   Json::Value document(Json::objectValue);

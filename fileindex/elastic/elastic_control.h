@@ -12,16 +12,21 @@
 /// own.
 namespace ferrox::fileindex::elastic {
 
-/// The schema of a share's index: no settings, the fields and their attributes, the engine's event handler.
+/// The schema of a share's index, the three parts of the request that makes one: no settings, the fields with their
+/// attributes, and where the event handler lies.
 /// @throws Error kInternal when a built-in text is damaged.
 FERROX_EXPORT Json::Value GetFileIndexSettings();
 FERROX_EXPORT Json::Value GetFileIndexMappings();
 FERROX_EXPORT Json::Value GetFileIndexEventHandler();
 
-/// "fileindex_" and the share's name.
+/// The id under which the engine keeps the share's index: "fileindex_" and the share's name.
 FERROX_EXPORT std::string GetFileIndexID(const std::string& share);
 
-/// @throws Error kNoSuchShare, kInternal for the share's database path.
+/// The index of a share. Create makes it empty at the share's database path; Pause closes it, so that its files can go
+/// away with their volume, and Resume opens it again; Delete drops it with its documents. Migrate has the engine move
+/// it to another path; Rename likewise, and gives it the other share's id.
+/// @throws Error kNoSuchShare, kInternal for the share's database path; kEngineIndexExists and kEngineNoSuchIndex are
+/// the engine's own.
 FERROX_EXPORT void ShareIndexCreate(const std::string& share);
 FERROX_EXPORT void ShareIndexPause(const std::string& share);
 FERROX_EXPORT void ShareIndexResume(const std::string& share);

@@ -7,6 +7,8 @@ namespace ferrox::fileindex::elastic {
 
 namespace {
 
+// Part of every index that is made: a text that changes here concerns new indices only. Old ones keep the schema with
+// which they were made until they are rebuilt.
 // Deliberate: "white space" with its blank, and KOVAMDFinderLabel and KOVAMDGroupId without the leading underscore of
 // the fields' names; existing indices were made so.
 constexpr char kMappings[] = R"json({
@@ -199,6 +201,7 @@ constexpr char kMappings[] = R"json({
 	}
 })json";
 
+// A library beside the package, named to the engine when an index is made. An engine may do without it.
 constexpr char kEventHandler[] = R"json({
 	"lib_path": "/var/packages/Ferrox/target/handler/fileindex_event_handler.so"
 })json";

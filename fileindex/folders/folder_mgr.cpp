@@ -28,6 +28,7 @@ namespace {
 
 using Flag = bool (Folder::*)() const;
 
+/// In this instance.
 std::string FoldersPath() { return InstancePath(kFileIndexFoldersCfgPath); }
 
 bool ReadFolders(Json::Value& folders, const std::string& path) {
@@ -43,6 +44,7 @@ Flag FlagOf(const std::string& sort_by) {
   return nullptr;
 }
 
+/// Stable, so that entries that are equal under the key keep the file's order. Another key than these sorts nothing.
 void SortFolders(std::vector<std::shared_ptr<Folder>>& folders, const std::string& sort_by) {
   const auto sort = [&folders](const auto& is_before) { std::stable_sort(folders.begin(), folders.end(), is_before); };
   if (sort_by == "path") {
@@ -162,6 +164,7 @@ void FolderMgr::Upsert(std::shared_ptr<Folder>& change, std::shared_ptr<Folder> 
   Remove(folder->GetPath(), *full_path);
   lookup.by_full_path.Insert(*full_path, folder);
   folders_.push_back(std::move(folder));
+  // After the change, since replacing an entry of a full list is no more than before.
   FERROX_FAIL_IF(folders_.size() > kFileIndexFoldersMax, Error::kTooManyFolders);
 }
 
@@ -177,7 +180,7 @@ void FolderMgr::Remove(const std::string& path, const std::string& full_path) {
   (void)std::erase_if(folders_, [&path](const auto& folder) { return folder->GetPath() == path; });
   if (lookup_->by_full_path.Find(full_path) == nullptr) return;
   lookup_->by_full_path.Erase(full_path);
-  (void)lookup_->Fill(folders_);
+  (void)lookup_->Fill(folders_);  // another entry of the same full path governs now
 }
 
 void FolderMgr::DeleteByShare(const std::string& share) {

@@ -76,7 +76,9 @@ class FERROX_EXPORT FolderMgr {
   std::set<std::string> GetIndexedShares() const;
 
  private:
+  /// Where the entries lie, looked up when a full path is first asked about and kept up to date by the changes below.
   FolderLookup& ByFullPath() const;
+  /// Removes all entries of the share path `path`; an entry of another share at the same full path takes its place.
   void Remove(const std::string& path, const std::string& full_path);
 
   std::vector<std::shared_ptr<Folder>> folders_;

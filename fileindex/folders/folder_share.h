@@ -7,7 +7,10 @@
 
 namespace ferrox::fileindex {
 
-/// Only a path that begins with "/" names a share.
+/// To which share an entry of the list belongs, where asking Folder::GetShare would throw or copy.
+
+/// Whether the entry names a share: only a path that begins with "/" does. The file may hold others, which govern
+/// nothing and can only be listed and deleted.
 inline bool HasShare(const Folder& folder) { return StringStartWith(folder.GetPath(), "/"); }
 
 /// Folder::GetShare() == share, without a copy; false for a folder without a share.

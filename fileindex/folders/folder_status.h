@@ -17,10 +17,11 @@ class FolderMgr;
 class QueueScan;
 class StatusMgr;
 
-/// The status of folders, many at the cost of few: the status file and the folders file are loaded once, each share is
-/// opened once, and its queue read once for all of its folders, each when it is first needed. What a folder is told, or
-/// what is thrown for it, is what asking for it alone would give; a failure that concerns several is logged once.
-/// Made per use, like the managers.
+/// The status of many folders at little more than the cost of one. Asking each folder alone would load both files,
+/// open the share and read its queue every time; here the status file and the folders file are loaded once, each share
+/// is opened once, and its queue read once for all of its folders, each when it is first needed. What is answered or
+/// thrown for a folder is what asking it alone would give. A failure that concerns several folders is logged once and
+/// thrown for each of them. Made per use, like the managers, and for one thread.
 class FolderStatus {
  public:
   /// For the folders of a listing; they must outlive the object.
@@ -35,18 +36,22 @@ class FolderStatus {
   Json::Value GetDataWithAdditional(const Folder& folder, const Json::Value& additionals);
 
  private:
+  /// What the folders of one share have in common.
   struct Share {
-    std::vector<const Folder*> folders;
+    std::vector<const Folder*> folders;  ///< those whose status may be asked for
     Memo<sdk::SDKShare> record;
-    Memo<QueueScan> scan;
+    Memo<QueueScan> scan;  ///< which of them something in the queue touches
   };
 
   void Add(const Folder& folder);
+  /// The share's record. @throws Error kNoSuchShare, every time.
   sdk::SDKShare& Open(Share& share, const std::string& name);
+  /// Whether queued or running work touches the folder or something below it.
   bool IsIndexing(Share& share, const Folder& folder);
 
-  std::unordered_map<std::string, Share> shares_;
+  std::unordered_map<std::string, Share> shares_;  ///< by name
   Memo<StatusMgr> status_mgr_;
+  /// Never asked; reading a queue alone loads it, and fails when it cannot, so that this must fail alike.
   Memo<FolderMgr> folder_mgr_;
 };
 

@@ -8,7 +8,8 @@
 
 namespace ferrox::fileindex {
 
-/// Something that is made when it is first needed, and then kept. So is the Error that its making threw.
+/// Something that is made when it is first needed, and then kept. When making it throws an Error, that is kept instead
+/// and thrown again at every later request, with its type, and nothing is tried again. For one thread.
 template <typename T>
 class Memo {
  public:
@@ -26,6 +27,7 @@ class Memo {
   }
 
  private:
+  // At most one of the two is set.
   std::unique_ptr<T> value_;
   std::exception_ptr failure_;
 };

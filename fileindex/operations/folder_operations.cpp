@@ -30,6 +30,8 @@ namespace {
 
 using Changes = std::vector<std::shared_ptr<Folder>>;
 
+/// The change that FolderAdd announces for a new folder: all kinds, whichever are on in it and whatever governed it
+/// before, so that the daemon compares all of it.
 std::shared_ptr<Folder> WithAllKinds(const Folder& folder) {
   return newClass<Folder>(folder.GetPath(), folder.GetName(), true, true, true, true, false, false);
 }
@@ -42,10 +44,12 @@ void QueueChanges(const Changes& changes) {
   }
 }
 
+/// The name of the step that queues the changes.
 std::string QueueingOf(const Changes& changes) {
   return "queue the changes of " + std::to_string(changes.size()) + " folders";
 }
 
+/// Has the index daemon look again at what it is to do for each of the shares: make, keep or end its worker.
 void AddNotifySteps(OperationSteps& steps, const std::set<std::string>& shares, bool is_upsert) {
   for (const std::string& share : shares) {
     steps.AddOfShare("tell the index daemon of", share,
@@ -53,6 +57,9 @@ void AddNotifySteps(OperationSteps& steps, const std::set<std::string>& shares, 
   }
 }
 
+/// FolderAdd and FolderSet. Everything is checked and put into `folder_mgr`, which is memory, before the first step;
+/// the folder lock keeps others from changing the file meanwhile. An index and its watches come before the file is
+/// saved: a folder that is in the file can be worked on. The events come last, when the daemon knows the new folders.
 void FolderUpsert(const Json::Value& folder_list, bool create, bool updater_mode) {
   const LockFile lock(InstancePath(kFolderLockPath), true);
   FolderMgr folder_mgr;
@@ -104,6 +111,7 @@ void AddForgetSteps(OperationSteps& steps, const std::string& share) {
                    [&share] { CleanShareIndexData(share, sdk::SDKShare(share).GetPath()); });
 }
 
+/// Makes the index of the share anew, empty, and has everything indexed again.
 void RebuildShare(const std::string& share_name) {
   const sdk::SDKShare share(share_name);
   DeleteShareIndex(share_name);
@@ -136,7 +144,7 @@ void FolderReindex(const Json::Value& path_list) {
   FERROX_FAIL_IF_AS(!IsJsonArray(path_list), "!path_list.isArray()", Error::kBadArgument, toString(path_list));
   std::set<std::string> to_rebuild;
   std::set<std::string> shares;
-  CustomEventWriter events;
+  CustomEventWriter events;  // queues at once; what an element throws later takes nothing back
   for (const Json::Value& it : path_list) {
     FERROX_FAIL_IF(!it.isString(), Error::kBadArgument, toString(it));
     const std::string share = GetShareNameByPath(it.asString());
@@ -178,6 +186,7 @@ void FolderDelete(const Json::Value& path_list) {
     shares.insert(change->GetShare());
   }
 
+  // A share that has folders left, and is there, is compared where they went; one that has none left loses everything.
   OperationSteps steps(__func__);
   Changes to_compare;
   for (const std::string& share : shares) {

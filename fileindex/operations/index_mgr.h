@@ -11,11 +11,11 @@
 
 /// The management operations: what is indexed, and how the index follows shares, volumes and users. Each loads the
 /// configuration, changes it, has the engine and the daemons follow, and queues events; none indexes a file itself.
-/// An operation first checks, then carries out its steps in a fixed order. A step that fails ends it: what stands before
-/// the step stays done, and OperationError (operation_error.h), with the step's code and reason, says what is not done;
-/// so does the log. Asking for the same again once the cause is gone finishes it.
-/// Unless they say that they throw nothing, each may throw besides the codes named kLoadFailed, kSaveFailed, kInternal,
-/// kEngineUnreachable and the engine's own codes.
+/// An operation first checks, then carries out its steps in a fixed order. A step that fails ends it: what stands
+/// before the step stays done, and OperationError (operation_error.h), with the step's code and reason, says what is
+/// not done; so does the log. Asking for the same again once the cause is gone finishes it. Unless they say that they
+/// throw nothing, each may throw besides the codes named kLoadFailed, kSaveFailed, kInternal, kEngineUnreachable and
+/// the engine's own codes.
 namespace ferrox::fileindex {
 
 /// Add folders (an array in the stored form, docs/formats/folders.md), or change those that exist and add the others.

@@ -8,7 +8,8 @@
 
 namespace ferrox::fileindex {
 
-/// A step of a management operation that was not carried out.
+/// A step of a management operation that was not carried out. Its text is for people and for the log, where the names
+/// of shares stand as they are; a program goes by `about`.
 struct OperationStep {
   std::string what;  ///< in the infinitive: "save the folders", "stop the worker of photo"
   Subject about;     ///< the share, user or list that it would have changed
@@ -16,10 +17,11 @@ struct OperationStep {
 
 /// How a management operation (index_mgr.h) fails once it has begun to change something. Code, reason and About() are
 /// those of the call that failed. What stood before the failed step is done and stays; an operation that fails before
-/// its first step throws a plain Error, or a SubjectError, and has changed nothing.
+/// its first step throws a plain Error, or a SubjectError, and has changed nothing. Who does not care catches Error.
 class FERROX_EXPORT OperationError : public SubjectError {
  public:
   /// `not_done` begins with the step that `failure` ended.
+  /// A subject that `failure` has is kept.
   OperationError(const Error& failure, std::vector<OperationStep> not_done);
   OperationError(const OperationError&) = default;
   OperationError& operator=(const OperationError&) = default;

@@ -28,9 +28,10 @@ class OperationSteps {
 
  private:
   struct Step {
-    OperationStep step;
+    OperationStep step;  ///< what a failure says of it
     std::function<void()> run;
   };
+  /// Logs that the step `first` and those behind it are not done. @return what Run throws for that.
   OperationError Stopped(size_t first, const Error& failure) const;
 
   const char* operation_;

@@ -43,6 +43,7 @@ constexpr char kFileIndexd[] = "pkg-Ferrox-fileindexd";
 constexpr char kFileSharing[] = "samba";
 constexpr size_t kPathBytes = 4096;
 
+/// The platform's last failure: its code and where in the platform it arose.
 std::string PlatformError() {
   char code[16];
   (void)snprintf(code, sizeof(code), "0x%04X", static_cast<unsigned>(KLIBCErrGet()));
@@ -63,6 +64,7 @@ void ReportSwitch(int result, const char* condition, int line = __builtin_LINE()
   errno = 0;
 }
 
+/// Spotlight: searches through the file-sharing service, which is restarted only when that is switched.
 void SetupSpotlight(bool enable) {
   if ((KOVASMBIsEnableSpotlight() != 0) == enable) return;
   if (!CallSucceeds(KOVASMBSetSpotlight(enable ? 1 : 0), "KOVASMBSetSpotlight")) return;

@@ -19,13 +19,15 @@
 #include "fileindex/util.h"
 #include "sdk/share.h"
 
-// None of these takes the folder lock.
+// How the index follows what the platform does with shares and volumes. None of these takes the folder lock: of two that
+// save at the same moment, one wins whole. The order of the steps decides what an operation leaves that stops half way.
 namespace ferrox::fileindex {
 
 namespace {
 
 constexpr char kRecycleBin[] = "/#recycle";
 
+/// In memory; AddSaveStep stores it.
 void SetPausedOfShare(const FolderMgr& folder_mgr, const std::string& share, bool paused) {
   for (const std::shared_ptr<Folder>& folder : folder_mgr.GetFolders()) {
     if (IsOfShare(*folder, share)) folder->SetPaused(paused);
@@ -42,6 +44,8 @@ bool LiesOnVolume(const Folder& folder, const std::string& mount_point) {
   return false;
 }
 
+/// The worker goes first, since it uses the index; what changes from then on waits in the queue, or is found by the
+/// comparison when the share goes on.
 void AddPauseSteps(OperationSteps& steps, const std::string& share) {
   steps.AddOfShare("stop the worker of", share, [&share] { DeleteWorker(share); });
   steps.AddOfShare("stop watching", share, [&share] { DeleteKOVANotifydCfg(share); });

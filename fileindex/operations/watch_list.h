@@ -8,19 +8,22 @@
 #include "base/path.h"
 #include "fileindex/folders/folder_mgr.h"
 
-/// What the notification daemon is asked to watch for a share. Inline: of use to whoever keeps registrations in step
-/// with the folders, without being one of the library's functions.
+/// What the notification daemon is asked to watch for a share. The management operations register it when folders
+/// change; the index daemon registers it, too, where it finds another list than this. Inline, since both need the same
+/// text and the library shows no function for it.
 namespace ferrox::fileindex {
 
-/// The application that registers.
+/// The application under which registrations are made. A later one of the same queue and application replaces the
+/// earlier.
 inline constexpr char kAppName[] = "fileindex";
-/// Content, attributes, creation, deletion and renames.
+/// The set of changes that are reported (kova/notifyd.h): content, attributes, creation, deletion and renames.
 inline constexpr int kWatchedChanges = 0xFFC6;
-/// Folders of this name are never watched.
+/// Folders of this name are never watched: the platform's own, which lie beside the files of users.
 inline constexpr char kNeverWatched[] = "@eaDir";
 
-/// The document of a registration (kova/notifyd.h): each folder that `folder_mgr` has of the share, in its order,
-/// reported into the queue at `queue_path`.
+/// The document of a registration (kova/notifyd.h): each folder that `folder_mgr` has of the share, in its order, with
+/// all below it; what changes there is reported into the queue at `queue_path`. Paused folders are in it, too.
+/// @throws Error kNoSuchShare when the share has folders and does not exist.
 inline Json::Value WatchListOf(const std::string& share, const std::string& queue_path, const FolderMgr& folder_mgr) {
   Json::Value document(Json::objectValue);
   document["queue"] = queue_path;
