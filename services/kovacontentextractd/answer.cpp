@@ -19,6 +19,7 @@ namespace {
 
 namespace elastic = fileindex::elastic;
 
+/// Longer texts of fields are dropped: readers cut theirs at half of this.
 constexpr size_t kFieldMaxBytes = 64U << 10;
 constexpr size_t kNameMaxBytes = 1024;
 /// Several times what all fields and attachments need: as a tree, an answer may be fifty times as large.
@@ -47,6 +48,7 @@ constexpr const char* kFacts[] = {elastic::kKOVAMDPath,
                                   elastic::kKOVAMDWildcard,
                                   elastic::kKOVAMDTextContent};
 
+/// The type of a field in the index, of which a worker's value is made.
 enum class Type { kText, kInteger, kNumber, kBool };
 using Types = std::map<std::string, Type>;
 

@@ -46,10 +46,11 @@ std::string HeadOf(int fd) {
   return head;
 }
 
+/// Whether a flag is set.
 bool Says(const Json::Value& fields, const char* flag) { return fields.get(flag, false).asBool(); }
 
-/// Text that is dropped is told, and how much there is, unless the document says already what it lacks.
-void TellCut(Json::Value& document, size_t text_bytes) {
+/// Notes in the document that its text is cut, and at what, unless it says already what it lacks.
+void NoteCut(Json::Value& document, size_t text_bytes) {
   constexpr size_t kCharacterMaxBytes = 4;
   if (!Says(document, kCutField) || document.isMember(kErrorField)) return;
   const bool full = text_bytes + kCharacterMaxBytes > kLimits.text_bytes;
@@ -57,12 +58,13 @@ void TellCut(Json::Value& document, size_t text_bytes) {
   document[kErrorField] = std::string(kPartlyRead) + (full ? first : "only the beginning of its text");
 }
 
-/// The reason why an attachment could not be read is one of the whole document; what is partly read, is so as well.
-void TellReason(Json::Value& document, const std::string& reason) {
+/// Notes why an attachment could not be read as the reason of the whole document, which has room for one: the first.
+void NoteReason(Json::Value& document, const std::string& reason) {
   if (document.isMember(kErrorField)) return;
   document[kErrorField] = (reason.starts_with(kPartlyRead) ? "" : "attachment: ") + reason;
 }
 
+/// A document that only says why there is nothing else.
 Json::Value ErrorDocument(const std::string& reason) {
   Json::Value document;
   document[kErrorField] = reason;
@@ -175,7 +177,7 @@ Json::Value Extractor::Read(int fd, std::string_view head, const std::string& pa
   }
   const size_t text_bytes = AddAttachments(answer, document, text);
   text.End(text_bytes);
-  TellCut(document, text_bytes);
+  NoteCut(document, text_bytes);
   return document;
 }
 
@@ -204,7 +206,7 @@ size_t Extractor::AddAttachments(const Answer& answer, Json::Value& document, Te
     const bool full = bytes + 1 >= kLimits.text_bytes;
     const bool late = std::chrono::steady_clock::now() > end;
     if (full) document[kCutField] = true;
-    if (late) TellReason(document, std::string(kPartlyRead) + "not all of its attachments");
+    if (late) NoteReason(document, std::string(kPartlyRead) + "not all of its attachments");
     if (full || late) break;
     if (!attachment.file.Valid()) continue;
     const size_t begin = bytes + 1, room = kLimits.text_bytes - begin;
@@ -223,9 +225,9 @@ size_t Extractor::AddAttachments(const Answer& answer, Json::Value& document, Te
     if (found.text_bytes > 0) bytes = begin + taken;
     if (found.text_bytes > taken || Says(found.fields, kCutField)) document[kCutField] = true;
     const Json::Value& reason = found.fields[kErrorField];
-    if (reason.isString()) TellReason(document, reason.asString());
+    if (reason.isString()) NoteReason(document, reason.asString());
     if (!found.attachments.empty()) {
-      TellReason(document, std::string(kPartlyRead) + "not the files within its attachments");
+      NoteReason(document, std::string(kPartlyRead) + "not the files within its attachments");
     }
   }
   return bytes;

@@ -14,7 +14,8 @@
 
 namespace ferrox::extract {
 
-/// Where a file's text goes: into the memory of who asks, or else into a string.
+/// Where a file's text goes: into the memory that the client sent as a descriptor with its request, or else into a
+/// string for the reply. Pieces come in order; attachments' texts follow the file's own.
 class TextTarget {
  public:
   explicit TextTarget(int memory) : memory_(memory) {}
@@ -35,7 +36,9 @@ class TextTarget {
 /// Gives back what a client's memory took of the system's; the client finds zeros there afterwards.
 void FreeTextMemory(int memory);
 
-/// Answers what the daemon is asked (docs/formats/extract.md). From any thread.
+/// Answers the daemon's requests (docs/formats/extract.md). From any thread. A file is opened here, since workers have
+/// no file system, and typed by its name and first bytes; then a worker of the pool reads it, and other workers the
+/// files within it. Nothing that a worker says goes into the reply unchecked.
 class Extractor {
  public:
   Extractor(const WorkerPool::Options& options, const OpenLimit::Options& limit);

@@ -35,6 +35,7 @@ void KeepMemoryForTexts() {
   (void)mallopt(M_TRIM_THRESHOLD, 32 << 20);
 }
 
+/// @throws Error kInternal when the workers are not installed.
 extract::WorkerPool::Options PoolOptions() {
   using namespace kova::content;
   if (ProgramFolder().empty()) {
@@ -50,6 +51,7 @@ extract::WorkerPool::Options PoolOptions() {
   return options;
 }
 
+/// As many threads as files may be opened at a time, so that those that hang in a file system leave others to work.
 void Serve() {
   services::Daemon daemon("kovacontentextractd");
   const extract::WorkerPool::Options pool_options = PoolOptions();

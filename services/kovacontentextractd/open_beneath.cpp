@@ -17,6 +17,7 @@ namespace {
 constexpr int kFileFlags = O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC | O_NOCTTY;
 constexpr int kFolderFlags = O_PATH | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC;
 
+/// openat2 does all of it in one call, without a race (Linux 5.6).
 int AskKernel(int root, const char* below, int flags) {
   open_how how = {};
   how.flags = static_cast<uint64_t>(flags);
@@ -35,6 +36,8 @@ base::UniqueFd StepInto(int folder, const char* name) {
   return next;
 }
 
+/// The same step by step: each folder is opened without following a link, relative to the one before, so a swap in
+/// between cannot lead elsewhere.
 int Walk(int root, const std::string& below, int flags) {
   base::UniqueFd folder(openat(root, ".", kFolderFlags));
   size_t begin = 0;
@@ -48,6 +51,7 @@ int Walk(int root, const std::string& below, int flags) {
   return folder.Valid() ? openat(folder.Get(), last.c_str(), flags) : -1;
 }
 
+/// ENOSYS, E2BIG and EINVAL say that the kernel does not know the call, or a flag of it.
 int Open(int root, const std::string& below, int flags, bool may_ask_kernel) {
   if (may_ask_kernel) {
     const int fd = AskKernel(root, below.c_str(), flags);

@@ -18,9 +18,13 @@ namespace ferrox::extract {
 
 namespace {
 
+// A region is written by a worker that may be hostile while the daemon reads it, so the daemon never maps it: it copies
+// by pread and sendfile, which a page that is taken away cannot fault.
+
 constexpr unsigned kNeverExecuted = 8;  // MFD_NOEXEC_SEAL, of Linux 6.3
 constexpr size_t kCharacterMaxBytes = 4;
 
+/// A file in memory that can be sealed, and not be executed where the kernel knows that.
 base::UniqueFd MakeMemory() {
   constexpr char kName[] = "kovacontentextractd";
   base::UniqueFd memory(memfd_create(kName, MFD_CLOEXEC | MFD_ALLOW_SEALING | kNeverExecuted));

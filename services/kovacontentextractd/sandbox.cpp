@@ -23,11 +23,17 @@ namespace ferrox::extract {
 
 namespace {
 
+// Four layers, each of which alone would keep a taken-over reader from files and network: no privileges and an empty
+// root (GiveUpRights), resource limits, Landlock, seccomp (CloseSandbox). A kernel or a container may lack some of
+// them: what is missing is reported and logged, and the worker runs nevertheless.
+
 constexpr uid_t kNobody = 65534;
 constexpr int kNiceness = 10;
+/// In all its life; a worker is replaced after some hundreds of files.
 constexpr rlim_t kCpuSecondsPerProcess = 3600;
 constexpr rlim_t kFilesMax = 16;  // the three usual ones, the daemon's socket, the file, and copies of it
 
+/// Sets a soft and a hard limit.
 bool Limit(__rlimit_resource resource, rlim_t value) {
   const rlimit limit = {value, value};
   return setrlimit(resource, &limit) == 0;
@@ -48,12 +54,14 @@ bool BecomeUser(uid_t user) { return setresgid(user, user, user) == 0 && setresu
 /// nothing to those of others, nor to what else runs as the user "nobody".
 uid_t OwnUser() { return 0x80000000U + static_cast<uid_t>(getpid()); }
 
+/// Also those of a user other than root, which a service manager may have given.
 bool DropCapabilities() {
   __user_cap_header_struct header = {_LINUX_CAPABILITY_VERSION_3, 0};
   const __user_cap_data_struct none[_LINUX_CAPABILITY_U32S_3] = {};
   return syscall(SYS_capset, &header, none) == 0;
 }
 
+/// Reading for the index is never urgent: others come first at processor and disk.
 bool YieldToOthers() {
   constexpr int kWhoProcess = 1, kIdleClass = 3, kClassShift = 13;
   const bool disk = syscall(SYS_ioprio_set, kWhoProcess, 0, kIdleClass << kClassShift) == 0;
@@ -173,6 +181,7 @@ bool AddRules(scmp_filter_ctx filter) {
   return AllowWhere(filter, {SCMP_SYS(tgkill), 0, kWhole, static_cast<scmp_datum_t>(getpid())}) && added;
 }
 
+/// A call that is not in the lists fails with EPERM. It does not kill: libraries try calls that they can do without.
 bool CloseSystemCalls() {
   const std::unique_ptr<void, decltype(&seccomp_release)> filter(seccomp_init(SCMP_ACT_ERRNO(EPERM)), &seccomp_release);
   return filter != nullptr && AddRules(filter.get()) && seccomp_load(filter.get()) == 0;

@@ -30,6 +30,7 @@ namespace ferrox::extract {
 
 namespace {
 
+/// Reads exactly so many bytes from the daemon; false when it has hung up.
 bool ReadAll(void* to, size_t size) {
   auto* bytes = static_cast<char*>(to);
   while (size > 0) {
@@ -54,6 +55,7 @@ bool WriteAll(const void* from, size_t size) {
   return true;
 }
 
+/// JSON in one line; one writer for all answers.
 std::string ToText(const Json::Value& value) {
   static const std::unique_ptr<Json::StreamWriter> writer = [] {
     Json::StreamWriterBuilder builder;
@@ -91,6 +93,7 @@ bool Answer(char* region, uint32_t number, const Findings& findings) {
   return Answer(number, fields, text.size());
 }
 
+/// A file to read, as the daemon asks for it. The descriptor is the worker's to close.
 struct Request {
   uint32_t number = 0;
   std::string reader;

@@ -5,11 +5,13 @@
 /// The main part of every worker program.
 namespace ferrox::extract {
 
+/// A reader by the name that kova::content::Format has for it.
 struct ReaderRow {
   const char* name;
   Reader reader;
 };
 
+/// What makes a worker program.
 struct Worker {
   const ReaderRow* readers;
   size_t reader_count;

@@ -19,9 +19,13 @@
 
 namespace ferrox::extract {
 
-/// Workers, some more than there are processors, of the programs that are asked for. They are made when they are
-/// needed, ended when they have read many files or have had nothing to do for a while, and replaced when a file has
-/// killed them. So is what they are made of.
+/// Workers of all programs, at most workers_max together. They are made when they are needed, ended when they have read
+/// files_per_worker files or have been idle for idle_time, and replaced when a file has killed them; so are the
+/// templates that they are forked from.
+///
+/// A file is blamed only for what it did itself: a worker that ended before it had seen the file is replaced and the
+/// file asked for again; one that crashes after having read other files too, whose traces in its memory may be the
+/// cause, has the file read once more by a new worker. Any thread may call any member.
 class WorkerPool {
  public:
   struct Options {
@@ -59,6 +63,7 @@ class WorkerPool {
 
  private:
   using SteadyClock = std::chrono::steady_clock;
+  /// A worker without work.
   struct Idle {
     std::unique_ptr<WorkerProcess> worker;
     kova::content::Program program;

@@ -30,6 +30,7 @@ constexpr milliseconds kStartMax(10000);
 /// For a process that has closed its socket to be gone.
 constexpr milliseconds kEndMax(2000);
 
+/// Rounded up, so that poll does not return just before the time; 0 when it has come.
 int MillisecondsUntil(SteadyClock::time_point end) {
   const auto left = std::chrono::ceil<milliseconds>(end - SteadyClock::now());
   return static_cast<int>(std::max<int64_t>(left.count(), 0));
@@ -77,6 +78,7 @@ bool WorkerProcess::Send(const Task& task) {
   return services::SendWithDescriptors(socket_.Get(), bytes, {task.fd});
 }
 
+/// An answer to the last request, or the greeting to request 0: a head, then its JSON text.
 WorkerProcess::Outcome WorkerProcess::Receive(TimePoint end, RawAnswer& answer) {
   AnswerHeader header;
   std::array<char, 4096> buffer;  // most answers are shorter

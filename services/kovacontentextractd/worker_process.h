@@ -29,7 +29,9 @@ struct RawAnswer {
   size_t text_bytes = 0;  ///< of the text in its region
 };
 
-/// A worker that runs. It may be at the mercy of the file that it reads.
+/// A worker that runs, as the daemon sees it: a child process, a socket, a region of memory that both share. It may be
+/// taken over by the file that it reads, so nothing that it does can block the daemon for longer than a time-out or
+/// make it allocate more than kAnswerMaxBytes. For one thread at a time, apart from Interrupt.
 class WorkerProcess {
  public:
   /// Has the template make one, and waits until it has closed its sandbox.
@@ -40,6 +42,7 @@ class WorkerProcess {
   const Json::Value& Missing() const { return missing_; }
   /// Whether it lives and waits for a file.
   bool IsReady() const;
+  /// How many files it was given.
   unsigned FilesRead() const { return requests_; }
   /// The memory that it shares with this process: a file.
   int Region() const { return region_.Get(); }
@@ -70,7 +73,7 @@ class WorkerProcess {
   base::UniqueFd region_;
   ChildProcess process_;
   Json::Value missing_ = Json::Value(Json::arrayValue);
-  uint32_t requests_ = 0;
+  uint32_t requests_ = 0;  ///< the number of the last request; answers repeat it
 };
 
 }  // namespace ferrox::extract

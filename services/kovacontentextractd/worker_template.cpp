@@ -21,6 +21,7 @@ namespace ferrox::extract {
 
 namespace {
 
+/// How long a program may take to load; on a machine that swaps, seconds.
 constexpr int kStartMaxMs = 10000;
 
 /// Starts the program with `socket` as its descriptor and nothing else of ours. @return 0 or an errno.

@@ -10,7 +10,8 @@
 namespace ferrox::extract {
 
 /// A worker program that has loaded what its readers need and then makes workers of itself, each by a fork: that takes
-/// a millisecond where loading takes many. It never reads a file, nor hears of what its workers do.
+/// a millisecond where loading takes many. It never reads a file, nor hears of what its workers do, so no file can take
+/// it over. For one thread at a time.
 class WorkerTemplate {
  public:
   /// Starts the program. @throws Error kInternal with a sentence when it cannot be started.

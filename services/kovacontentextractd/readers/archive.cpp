@@ -17,6 +17,11 @@ namespace ferrox::extract {
 
 namespace {
 
+// The library detects packings ("filters") and formats by itself and reads through callbacks: the worker has an open
+// descriptor and no file name. ZIP files are read by ZipContainer where that can be: their list of names stands at the
+// end, and need not be searched for.
+
+/// How much the library is given at a time.
 constexpr size_t kPieceBytes = 64U << 10;
 /// Of a packed archive, all must be unpacked to find the names in it: no more than takes a few seconds.
 constexpr int64_t kUnpackedMaxBytes = 1LL << 30;
@@ -36,7 +41,8 @@ struct Input {
   uint64_t read_in_vain = 0;
 };
 
-/// Padding behind packed data may be as long as it likes.
+/// Whether the library has read much of the file without unpacking any more: some packings allow padding behind their
+/// data, of any length, which is no reason to read a whole disk image.
 bool LeadsNowhere(archive* reader, Input& input) {
   constexpr uint64_t kReadInVainMaxBytes = 16U << 20;
   const int64_t unpacked = archive_filter_bytes(reader, 0);
@@ -45,6 +51,7 @@ bool LeadsNowhere(archive* reader, Input& input) {
   return input.read_in_vain > kReadInVainMaxBytes;
 }
 
+// What the library calls: to read on, to pass bytes, to go to a place.
 la_ssize_t OnRead(archive* reader, void* data, const void** buffer) {
   auto& input = *static_cast<Input*>(data);
   if (LeadsNowhere(reader, input)) return 0;
@@ -72,6 +79,7 @@ la_int64_t OnSeek(archive*, void* data, la_int64_t offset, int whence) {
   return static_cast<la_int64_t>(input.at);
 }
 
+/// A reader that has found packings and format, or null where there is none.
 std::unique_ptr<archive, Free> Open(Input& input) {
   std::unique_ptr<archive, Free> reader(archive_read_new());
   archive* const raw = reader.get();
@@ -133,6 +141,7 @@ locale_t Utf8Locale() {
   return locale;
 }
 
+/// Gives this thread a locale in UTF-8 for as long as it lives.
 class Utf8Names {
  public:
   Utf8Names() : before_(uselocale(Utf8Locale())) {}
@@ -144,6 +153,7 @@ class Utf8Names {
   locale_t before_;
 };
 
+/// The name as UTF-8 where the library can say that, else as bytes.
 const char* NameOf(archive_entry* entry) {
   const char* name = archive_entry_pathname_utf8(entry);
   return name != nullptr ? name : archive_entry_pathname(entry);
@@ -167,6 +177,7 @@ const char* ProblemOf(archive* reader) {
   return archive_read_has_encrypted_entries(reader) > 0 ? "encrypted" : "damaged";
 }
 
+/// Goes through the members, without their content where the format allows that.
 void AddNames(archive* reader, MemberNames& names, Findings& findings) {
   for (int count = 0; count < kNamesMax; ++count) {
     archive_entry* entry = nullptr;

@@ -32,6 +32,7 @@ namespace ferrox::extract {
 
 namespace {
 
+/// Length, rates and channels, where the library found them.
 void AddProperties(const TagLib::AudioProperties& properties, Findings& findings) {
   findings.Set("KOVAMDMediaTypes", "Sound");
   if (properties.lengthInMilliseconds() > 0) {
@@ -64,6 +65,7 @@ const char* WavCodec(int format) {
   }
 }
 
+/// The codec's usual name; "" where the format does not tell. The library has a class for each format, not a name.
 const char* CodecOf(const TagLib::File& file) {
   if (const auto* mpeg = dynamic_cast<const TagLib::MPEG::File*>(&file)) {
     return mpeg->audioProperties() != nullptr && mpeg->audioProperties()->layer() == 2 ? "MP2" : "MP3";
@@ -113,7 +115,9 @@ void AddOggLength(TagLib::File& file, Findings& findings) {
   }
 }
 
-/// DSF: two chunks of fixed size, and at the end a tag as MP3 has it. The library does not know it.
+/// DSF, which the library does not know: a chunk "DSD " of 28 bytes with the place of the tag (at 14), a chunk "fmt "
+/// with channels (at 34), rate (at 38), bits of a sample (at 3C) and samples (at 40), numbers with the low byte first;
+/// at the end a tag as MP3 has it.
 void ReadDsf(const Source& source, const std::string& head, Findings& findings) {
   constexpr size_t kHeadBytes = 80;
   if (head.size() < kHeadBytes || head.compare(28, 4, "fmt ") != 0) return findings.Fail("damaged");
@@ -133,6 +137,7 @@ void ReadDsf(const Source& source, const std::string& head, Findings& findings) 
   if (file.isValid()) AddTags(file.properties(), findings);
 }
 
+/// Any format of the library, which detects it by the extension and the first bytes.
 void ReadTagged(const Source& source, Findings& findings) {
   AudioStream stream(source, 0, source.size, "file." + source.extension);
   const TagLib::FileRef reference(&stream);

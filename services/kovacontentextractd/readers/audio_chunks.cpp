@@ -16,6 +16,7 @@ namespace {
 constexpr size_t kTextMaxBytes = 64U << 10;
 constexpr int kChunksMax = 1000;
 
+/// What a format's head says of its sound.
 struct Sound {
   const char* codec = "";
   double rate = 0;
@@ -96,10 +97,14 @@ void EachChunk(const FileBytes& file, uint64_t at, size_t size_bytes, bool even,
   }
 }
 
+/// A chunk's content, as far as a text may be long.
 std::string TextOf(const FileBytes& file, const Chunk& chunk) {
   return file.ReadAt(chunk.at, static_cast<size_t>(std::min<uint64_t>(chunk.size, kTextMaxBytes)));
 }
 
+/// The chunk "desc": rate (a double, 8 bytes), codec (4, at 8), flags (4), bytes of a packet (4, at 10), frames of a
+/// packet (4, at 14), channels (4, at 18), bits of a sample (4, at 1C). `frame_bytes` stays 0 where a packet has
+/// several frames.
 void ReadCafFormat(const std::string& format, Sound& sound, uint64_t& frame_bytes) {
   static constexpr std::pair<std::string_view, const char*> kCodecs[] = {
       {"lpcm", "PCM"},  {"alac", "ALAC"}, {"aac ", "AAC"},    {"ima4", "ADPCM"}, {".mp3", "MP3"},
@@ -114,6 +119,7 @@ void ReadCafFormat(const std::string& format, Sound& sound, uint64_t& frame_byte
   }
 }
 
+/// The chunk "info": a count (4 bytes), then names and texts in turn, each ended by a zero.
 void AddCafTexts(std::string_view texts, TagLib::PropertyMap& tags) {
   texts.remove_prefix(std::min<size_t>(4, texts.size()));
   while (!texts.empty()) {

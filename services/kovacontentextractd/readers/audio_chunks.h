@@ -7,7 +7,10 @@
 namespace ferrox::extract {
 
 /// Whole formats that the tag library does not know. Each tells whether the file is of its format.
+/// AU, of Sun: ".snd", then numbers of 4 bytes, high byte first: place of the sound, its size, encoding, rate,
+/// channels; then a text, up to the sound.
 bool ReadAu(const Source& source, Findings& findings);
+/// CAF, of Apple: "caff", version and flags (4 bytes), then chunks with sizes of 8 bytes.
 bool ReadCaf(const Source& source, Findings& findings);
 
 /// The texts in chunks of an AIFF file, beside those of its tag, which count more.

@@ -7,10 +7,12 @@ namespace ferrox::extract {
 
 namespace {
 
+/// At a time: a tag with a picture in it.
 constexpr long kBlockMaxBytes = 16L << 20;
+/// In all, from one file.
 constexpr long kReadMaxBytes = 256L << 20;
 constexpr std::chrono::milliseconds kCpuMax(1500);
-/// No sound is longer; what is holds sound to the library's mind, which searches it step by step.
+/// No file of sound is longer. In what is, the library would search for sound step by step.
 constexpr uint64_t kLengthMaxBytes = 4ULL << 30;
 
 }  // namespace

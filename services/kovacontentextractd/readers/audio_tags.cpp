@@ -10,6 +10,7 @@ namespace ferrox::extract {
 
 namespace {
 
+/// The library's name for a tag, which is the same for all formats, and the field that it fills.
 struct TagField {
   const char* tag;
   const char* field;
@@ -36,6 +37,7 @@ constexpr TagField kTextTags[] = {
     {"ENCODEDBY", "KOVAMDEncodingApplications"},
 };
 
+/// The number at the beginning of "3/12" or "2024-03-01"; 0 when there is none.
 int64_t LeadingNumber(const std::string& text) {
   int64_t number = 0;
   (void)std::from_chars(text.data(), text.data() + text.size(), number);

@@ -6,7 +6,8 @@
 
 namespace ferrox::extract {
 
-/// What the tags of a sound say, by the names that the library has for them.
+/// Sets the fields for the tags of a sound, which have the names that the library gives them in all formats. Lyrics are
+/// the file's text. Texts that are UTF-8 or a legacy encoding behind a tag that says Latin-1 are put right.
 void AddTags(const TagLib::PropertyMap& tags, Findings& findings);
 
 }  // namespace ferrox::extract

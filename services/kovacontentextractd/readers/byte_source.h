@@ -10,7 +10,8 @@
 
 namespace ferrox::extract {
 
-/// Bytes that come one piece after the other.
+/// Bytes that come one piece after the other: a file, a member of a container as it is unpacked, a stream within a
+/// file.
 class ByteSource {
  public:
   virtual ~ByteSource() = default;
@@ -28,6 +29,7 @@ class FileBytes {
   uint64_t Size() const { return size_; }
   /// Reads as many of the `room` bytes at `offset` as the file has; fewer only at its end, or where it cannot be read.
   size_t ReadAt(uint64_t offset, char* buffer, size_t room) const;
+  /// The same as a string; "" behind the end.
   std::string ReadAt(uint64_t offset, size_t room) const;
 
  private:

@@ -12,6 +12,8 @@ namespace ferrox::extract {
 
 namespace {
 
+/// A date, a time or both; empty for what no calendar of Excel has. Day 25569 is 1970-01-01; days that are counted from
+/// 1904 begin 1462 days later, and 2958466 is the first day of the year 10000.
 std::string DateText(double days, bool from_1904) {
   constexpr double kEpochDays = 25569, kDays1904 = 1462, kDaysMax = 2958466;
   const double since_1900 = days + (from_1904 ? kDays1904 : 0);
@@ -30,6 +32,7 @@ std::string DateText(double days, bool from_1904) {
   return {text.data(), static_cast<size_t>(size)};
 }
 
+/// With as many digits as Excel keeps.
 std::string GeneralText(double value) {
   std::array<char, 64> text;
   const auto written = std::to_chars(text.data(), text.data() + text.size(), value, std::chars_format::general, 15);
@@ -68,6 +71,9 @@ bool IsOneOf(char c, std::string_view signs) { return signs.find(c) != std::stri
 
 }  // namespace
 
+/// A format is a text such as "#,##0.00" or "dd/mm/yyyy;@": up to four parts, for positive numbers, negative ones, zero
+/// and texts, of which the first is followed. Whatever has letters of a date counts as one. Fractions, exponents, and
+/// numbers shown in thousands are shown as they are.
 NumberFormat ParseNumberFormat(std::string_view code) {
   constexpr int kDecimalsMax = 15;
   NumberFormat format;
@@ -96,6 +102,7 @@ NumberFormat ParseNumberFormat(std::string_view code) {
 
 NumberFormat BuiltInNumberFormat(int id) {
   const auto is_in = [id](int first, int last) { return id >= first && id <= last; };
+  // The numbers are fixed by the file format, some of them for dates of East Asian calendars.
   if (is_in(14, 22) || is_in(27, 36) || is_in(45, 47) || is_in(50, 58)) return {NumberFormat::kDate};
   static constexpr const char* kCodes[] = {"General", "0",        "0.00",     "#,##0", "#,##0.00", "#,##0",
                                            "#,##0",   "#,##0.00", "#,##0.00", "0%",    "0.00%"};

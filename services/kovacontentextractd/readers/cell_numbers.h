@@ -14,6 +14,8 @@ struct NumberFormat {
   bool percent = false;
 };
 
+/// Reads a format as people write it in the program. What it does with a number beyond what NumberFormat has is not
+/// followed: such a number is kGeneral.
 NumberFormat ParseNumberFormat(std::string_view code);
 /// The format that programs have under this number without writing it down.
 NumberFormat BuiltInNumberFormat(int id);

@@ -16,7 +16,12 @@ namespace {
 
 using Token = XmlTokenizer::Token;
 
+// EPUB is a ZIP file. META-INF/container.xml names the package, an XML file (OPF) with properties, the list of all
+// parts (item: id, href) and the order in which they are read (itemref: idref). The parts are HTML, relative to the
+// package.
+
 constexpr size_t kPartsMax = 20000;
+/// Of one chapter, what is read.
 constexpr size_t kChapterMaxBytes = 4U << 20;
 
 constexpr PropertyField kPackageFields[] = {
@@ -78,6 +83,8 @@ std::vector<std::string> Chapters(ByteSource& package, const std::string& folder
 
 }  // namespace
 
+/// The package is read twice, for properties and for chapters: it is small, and neither needs the whole of it in
+/// memory.
 void ReadElectronicBook(const Source& source, Findings& findings) {
   ZipContainer zip(source, findings);
   if (!zip.IsOpen()) return;

@@ -4,7 +4,7 @@
 
 namespace ferrox::extract {
 
-/// Books in EPUB.
+/// Books in EPUB: properties, and the text of the chapters in reading order.
 void ReadElectronicBook(const Source& source, Findings& findings);
 
 }  // namespace ferrox::extract

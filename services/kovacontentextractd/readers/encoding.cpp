@@ -18,13 +18,21 @@ namespace ferrox::extract {
 
 namespace {
 
+// What encoding a text is in is decided by certainty: what its bytes prove (marks, valid UTF-8, zeros of UTF-16,
+// escapes), then what it says itself, then what statistics make of it (libuchardet), which needs some dozens of letters
+// outside ASCII. The C library's converters do the rest; they are files of their own and must be loaded before the
+// sandbox closes (LoadConverters).
+
+/// How much statistics are shown.
 constexpr size_t kDetectMaxBytes = 16 * 1024;
 /// With fewer bytes outside ASCII than this, statistics is guessing.
 constexpr size_t kSureFromBytes = 24;
+/// What a text is read as when nothing tells more.
 constexpr char kWestern[] = "WINDOWS-1252";
 
 using namespace std::literals;
 
+/// Bell to carriage return, the end mark of DOS, escape.
 bool IsTextControl(unsigned char c) { return (c >= 0x07 && c <= 0x0d) || c == 0x1a || c == 0x1b; }
 
 /// Whether there are more control characters than a text has (a few form feeds, escapes of a terminal's log).
@@ -112,6 +120,8 @@ bool Convert(std::string_view bytes, const std::string& encoding, bool cut, std:
 }
 
 // UTF-16 and UTF-32 need no tables; done here, a file of either costs no converter.
+
+// False when more than one unit in a hundred is none that a text has: an unpaired surrogate, a zero, U+FFFE.
 
 bool FromUtf16(std::string_view bytes, bool big_endian, std::string& text) {
   text.clear();
@@ -212,6 +222,7 @@ bool DamagedUtf8(std::string_view bytes, DecodedText& decoded) {
   return true;
 }
 
+/// "ESC $ B" or "ESC $ @", which switch ISO-2022-JP to two bytes a character; the rest of it looks like ASCII.
 bool HasJapaneseEscapes(std::string_view bytes) {
   const size_t escape = bytes.find("\x1b$"sv);
   return escape != std::string_view::npos && escape + 2 < bytes.size() &&
@@ -225,6 +236,7 @@ std::string_view TellingPart(std::string_view bytes) {
   return bytes.substr(at > 256 ? at - 256 : 0, kDetectMaxBytes);
 }
 
+/// What statistics say of the bytes; empty when nothing.
 std::string Detect(std::string_view bytes) {
   const std::unique_ptr<uchardet, decltype(&uchardet_delete)> detector(uchardet_new(), &uchardet_delete);
   if (detector == nullptr || uchardet_handle_data(detector.get(), bytes.data(), bytes.size()) != 0) return {};
@@ -317,6 +329,7 @@ void LoadConverters() {
   for (const char* encoding : kInUse) HoldConverter(encoding, "UTF-8");
 }
 
+/// In the order of certainty that the header gives. Zeros in what is not UTF-16 are no text.
 bool Decode(std::string_view bytes, bool cut, const std::string& declared, DecodedText& decoded) {
   decoded = {};
   const int by_mark = ByMark(bytes, cut, decoded);

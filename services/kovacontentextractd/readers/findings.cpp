@@ -67,6 +67,7 @@ bool Holds(std::string_view joined, std::string_view value) {
 
 }  // namespace
 
+/// Cut at the border of a character. A text that is bad UTF-8 grows by its replacements, so it is cut once more.
 bool Findings::AddText(std::string_view text) {
   if (cut_) return false;
   const size_t room = limits_.text_bytes - std::min(limits_.text_bytes, text_.size());

@@ -32,6 +32,7 @@ std::string WithoutDoubleEncoding(std::string text) {
 }
 
 std::string TrueEncoding(std::string_view texts) {
+  // Fewer bytes outside ASCII tell nothing, and Latin text has more plain letters than others.
   constexpr size_t kTellingBytes = 6;
   std::string bytes;
   if (!Latin1Bytes(texts, bytes)) return {};

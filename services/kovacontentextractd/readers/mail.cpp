@@ -20,13 +20,21 @@ namespace ferrox::extract {
 
 namespace {
 
+// A message is headers and a tree of parts (MIME): "multipart/mixed" has parts one after the other, "alternative" the
+// same text in several forms, "related" a page and what it is made of; leaves are texts and attached files. The library
+// parses headers, transfer encodings and borders; here is decided what of the tree is text. A box (mbox) is a row of
+// messages, each behind a line that begins with "From ".
+
+// What is read of one file.
 constexpr int kMessagesMax = 20000;
 constexpr std::chrono::milliseconds kCpuMax(4000);
+// Of one message.
 constexpr int kPartsMax = 1000;
 constexpr int kLevelsMax = 16;
 constexpr int kAddressesMax = 500;
 constexpr size_t kPartMaxBytes = 2U << 20;
 
+/// For the library's objects, which count their users.
 struct Unref {
   void operator()(void* object) const { g_object_unref(object); }
 };
@@ -80,6 +88,7 @@ class MailReader {
     findings_.MarkCut();
   }
 
+  /// People, and of a single message its subject, date and the like.
   void AddHeader(GMimeMessage* message) {
     encoding_ = TrueEncoding(View(g_mime_message_get_subject(message)));
     AddPeople(message, GMIME_ADDRESS_TYPE_FROM, "KOVAMDAuthors", "KOVAMDAuthorAddresses");
@@ -106,6 +115,7 @@ class MailReader {
     AddAddresses(g_mime_message_get_addresses(message, type), names, addresses, 0);
   }
 
+  /// Names and addresses; those of a group ("team: a@b, c@d;") one by one.
   void AddAddresses(InternetAddressList* list, const char* names, const char* addresses, int level) {
     const int length = list != nullptr ? internet_address_list_length(list) : 0;
     const int count = level < 3 ? std::min(length, kAddressesMax) : 0;
@@ -130,6 +140,7 @@ class MailReader {
     return AddObject(g_mime_message_get_mime_part(message), level);
   }
 
+  /// A node of the tree, of whatever kind. `level` is its depth. False when the findings take no more.
   bool AddObject(GMimeObject* object, int level) {
     if (object == nullptr) return true;
     if (level > kLevelsMax || ++parts_ > kPartsMax) return LeaveOut("not all of its parts");
@@ -168,6 +179,7 @@ class MailReader {
     return more;
   }
 
+  /// The part in plain text; null when there is none.
   static GMimeObject* PlainAlternative(GMimeMultipart* multipart, int count) {
     for (int i = 0; i < count; ++i) {
       GMimeObject* part = g_mime_multipart_get_part(multipart, i);
@@ -193,6 +205,8 @@ class MailReader {
     return more;
   }
 
+  /// A leaf: its name, and its text, or what it is made of for the reader of its kind. While the forms beside a plain
+  /// text are read, one counts only when it is more than twice as long.
   bool AddPart(GMimePart* part) {
     const std::string_view name = View(g_mime_part_get_filename(part));
     AddLine(name);

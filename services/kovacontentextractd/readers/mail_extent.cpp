@@ -15,6 +15,7 @@ constexpr int kHeaderLinesMax = 20000;
 constexpr uint64_t kHeaderBytesMax = 1U << 20;
 constexpr int kBordersMax = 10000;  ///< lines that may begin a part
 
+/// Counts, line by line, what the library would keep of the present message.
 class Extent {
  public:
   explicit Extent(bool is_box) : is_box_(is_box) {}

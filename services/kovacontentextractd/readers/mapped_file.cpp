@@ -8,6 +8,7 @@ namespace ferrox::extract {
 
 namespace {
 
+/// Half of the address space that a worker has (sandbox.cpp), or less.
 constexpr size_t kMappedMaxBytes = sizeof(void*) == 8 ? 128U << 20 : 48U << 20;
 
 }  // namespace

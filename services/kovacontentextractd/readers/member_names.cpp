@@ -44,6 +44,9 @@ std::string CyrillicEncoding(std::string_view words) {
 
 }  // namespace
 
+/// The statistics are made for prose, so the words of all names are given to them together, again and again until they
+/// are a text of some length. They are believed where they say an East Asian or Cyrillic encoding; Western and
+/// Central European ones look too much alike.
 std::string EncodingOfNames(std::string_view names) {
   static constexpr const char* kTelling[] = {"CP932", "EUC-JP", "GB18030", "BIG5-HKSCS", "UHC", "IBM866", "KOI8-U"};
   constexpr size_t kSampleBytes = 600;  // what the statistics want to see
@@ -68,6 +71,7 @@ bool MemberNames::Add(std::string_view name, std::string_view otherwise) {
   return bytes_ <= findings_.Bounds().text_bytes;
 }
 
+/// Decodes the names that are not UTF-8, all with one encoding: one system has packed them.
 void MemberNames::DecodeOld() {
   std::string old;
   for (const Name& name : names_) {

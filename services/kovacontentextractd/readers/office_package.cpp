@@ -11,6 +11,7 @@ namespace {
 
 using Token = XmlTokenizer::Token;
 
+/// Of one part; a sheet with as many links has one for each.
 constexpr size_t kRelationsMax = 20000;
 
 std::string_view FolderOf(std::string_view path) {
@@ -28,12 +29,14 @@ std::string Resolve(std::string_view folder, std::string_view target) {
   return folder.empty() ? std::string(target) : std::string(folder) + "/" + std::string(target);
 }
 
+/// The member with a part's relations.
 std::string RelationsOf(std::string_view part) {
   const std::string_view folder = FolderOf(part);
   const std::string_view name = part.substr(folder.empty() ? 0 : folder.size() + 1);
   return (folder.empty() ? "" : std::string(folder) + "/") + "_rels/" + std::string(name) + ".rels";
 }
 
+// docProps/core.xml: Dublin Core and what the authors set.
 constexpr PropertyField kCoreFields[] = {
     {"title", "KOVAMDTitle"},
     {"creator", "KOVAMDAuthors", PropertyField::kSemicolonList},
@@ -49,6 +52,7 @@ constexpr PropertyField kCoreFields[] = {
     {"modified", "KOVAMDContentModificationDate", PropertyField::kTime},
 };
 
+// docProps/app.xml: what the program wrote.
 constexpr PropertyField kApplicationFields[] = {
     {"Application", "KOVAMDCreator"},
     {"Application", "KOVAMDEncodingApplications"},

@@ -9,7 +9,12 @@
 #include "services/kovacontentextractd/readers/xml_tokenizer.h"
 #include "services/kovacontentextractd/readers/zip_container.h"
 
-/// What the kinds of Office Open XML share: parts that point to others by relations, paragraphs, properties.
+/// What the kinds of Office Open XML (ECMA-376) share: parts that point to others by relations, paragraphs, properties.
+///
+/// A document is a ZIP file of parts. What belongs together is not told by names but by relations: the part "a/b.xml"
+/// has its in "a/_rels/b.xml.rels", the container its own in "_rels/.rels". A relation has an id, by which the part's
+/// text refers to it, a type (an address that ends in, for example, "/styles") and a target relative to the part's
+/// folder. Elements are taken by their names without prefix: all of w:t, a:t and t are text.
 namespace ferrox::extract {
 
 struct Relation {

@@ -17,6 +17,10 @@ namespace {
 
 using Token = XmlTokenizer::Token;
 
+// OpenDocument (ISO 26300) is a ZIP file with content.xml (the text, sheets or slides), styles.xml (headers and
+// footers), meta.xml (properties) and META-INF/manifest.xml (which members there are, and whether they are encrypted).
+// Embedded objects are folders with a content.xml of their own.
+
 constexpr PropertyField kMetaFields[] = {
     {"title", "KOVAMDTitle"},
     {"initial-creator", "KOVAMDAuthors"},
@@ -47,6 +51,7 @@ void AddBlank(std::string_view name, Findings& findings) {
   if (name == "line-break") findings.Break();
 }
 
+/// Paragraphs and headings.
 bool IsParagraph(std::string_view name) { return name == "p" || name == "h"; }
 
 /// Stands in the midst of a paragraph, even of a word, and is not of it: notes and their marks, comments with their
@@ -62,6 +67,7 @@ bool IsBare(std::string_view name) {
   return name == "footer-decl" || name == "header-decl" || name == "title" || name == "desc";
 }
 
+/// Headers and footers, of the first page, of left ones and of all.
 bool IsPageEdge(std::string_view name) { return name.starts_with("header") || name.starts_with("footer"); }
 
 /// Collects the text of paragraphs, with a row of a table in a line: of a whole part, or of the headers and footers in
@@ -90,6 +96,7 @@ class ContentReader {
  private:
   static constexpr size_t kObjectsMax = 1000;
 
+  /// An element begins.
   void Open(std::string_view name) {
     if (IsPageEdge(name)) ++wanted_;
     if (IsParagraph(name) || IsBare(name)) {
@@ -109,6 +116,7 @@ class ContentReader {
     }
   }
 
+  /// It ends. A paragraph within a cell ends with a tab, others with a line.
   void Close(std::string_view name) {
     if (IsPageEdge(name)) --wanted_;
     if (IsParagraph(name) || IsBare(name)) {
@@ -139,6 +147,7 @@ class ContentReader {
     value_.clear();
   }
 
+  /// Notes an object for later: its text comes behind that of the document.
   void AddObject(std::string_view address) {
     if (address.starts_with("./")) address.remove_prefix(2);
     if (!address.empty() && objects_.size() < kObjectsMax) objects_.push_back(std::string(address) + "/content.xml");

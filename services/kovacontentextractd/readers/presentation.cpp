@@ -8,6 +8,9 @@ namespace {
 
 using Token = XmlTokenizer::Token;
 
+// The main part lists the slides by the ids of their relations; each slide is a part with paragraphs, which has
+// relations to its notes, comments, diagrams and charts.
+
 constexpr size_t kSlidesMax = 20000;
 
 /// The ids of the slides' relations, in the order in which they are shown.
@@ -26,6 +29,7 @@ std::vector<std::string> SlideIds(ZipContainer& zip, const std::string& part) {
 
 }  // namespace
 
+/// Slide by slide, each with what belongs to it. Masters and layouts hold the program's words, and are not read.
 void ReadPresentation(ZipContainer& zip, const std::string& part, Findings& findings) {
   const std::vector<Relation> relations = ReadRelations(zip, part);
   const std::vector<std::string> ids = SlideIds(zip, part);

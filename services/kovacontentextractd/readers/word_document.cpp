@@ -2,6 +2,7 @@
 
 namespace ferrox::extract {
 
+/// The text, then what stands beside it: notes, comments, the edges of pages, diagrams, charts, building blocks.
 void ReadWordDocument(ZipContainer& zip, const std::string& part, Findings& findings) {
   if (!AddParagraphs(zip, part, findings)) return;
   (void)AddRelated(

@@ -12,9 +12,15 @@ namespace {
 
 using Token = XmlTokenizer::Token;
 
+// A workbook is several parts: the list of sheets, styles, the table of texts that cells share, and a part for each
+// sheet with its cells by rows. A cell (c) has a type (t: s a number in the table of texts, str, inlineStr and d a text
+// of its own, n or nothing a number), the number of its style (s) and its value (v). Texts are read from their table,
+// not where cells use them, so each occurs once however many cells have it.
+
 constexpr size_t kSheetsMax = 10000;
 constexpr size_t kStylesMax = 65536;
 
+/// What reading a sheet needs of the other parts.
 struct Workbook {
   std::vector<std::string> sheets;  ///< the ids of their relations
   bool from_1904 = false;           ///< days are counted from 1904, not from 1900
@@ -39,6 +45,7 @@ int ToInt(std::string_view text) {
   return value;
 }
 
+/// The number format of each style of cells, by the styles' places in the list "cellXfs".
 void ReadStyles(ZipContainer& zip, const std::string& part, Workbook& workbook) {
   std::map<int, NumberFormat> formats;
   bool in_cell_styles = false;
@@ -97,6 +104,7 @@ class SheetReader {
  public:
   SheetReader(const Workbook& workbook, Findings& findings) : workbook_(workbook), findings_(findings) {}
 
+  /// One token of the sheet. Formulas are passed over: what they give is the value beside them.
   bool Take(XmlTokenizer& xml, Token token) {
     if (token == Token::kText) {
       if (in_value_ && value_.size() < kValueMaxBytes) value_ += xml.Text();

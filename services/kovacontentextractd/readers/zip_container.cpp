@@ -16,6 +16,7 @@ class ZipMember : public ByteSource {
   ZipMember(const ZipMember&) = delete;
   ZipMember& operator=(const ZipMember&) = delete;
 
+  /// Unpacks on. A member ends where it is damaged or a limit is reached, which the findings are told.
   size_t Read(char* buffer, size_t room) override {
     if (ended_ || container_.exhausted_) return 0;
     const zip_int64_t got = zip_fread(file_, buffer, room);
@@ -41,7 +42,7 @@ namespace {
 
 bool IsDigit(char c) { return c >= '0' && c <= '9'; }
 
-/// "slide2" before "slide10".
+/// Digits count as one number: "slide2" before "slide10". Names that only differ in leading zeros are equal.
 bool NaturalLess(const std::string& a, const std::string& b) {
   size_t i = 0, k = 0;
   while (i < a.size() && k < b.size()) {

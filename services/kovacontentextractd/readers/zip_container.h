@@ -14,9 +14,12 @@ struct zip;
 namespace ferrox::extract {
 
 /// The members of a ZIP file, unpacked as they are read and within the limits: those of a member, and the expansion of
-/// all that is unpacked together. What goes wrong is said to the findings, and ends the member.
+/// all that is unpacked together, whether or not members share their packed bytes. What goes wrong is said to the
+/// findings, and ends the member. A "zip bomb" thus costs what Limits allow: for a small file 1 MiB, else 100 bytes for
+/// each packed one, and never more than 256 MiB.
 class ZipContainer {
  public:
+  /// Reads the list of members at the end of the file; fails with "damaged" when there is none.
   ZipContainer(const Source& source, Findings& findings);
   ~ZipContainer();
   ZipContainer(const ZipContainer&) = delete;

@@ -16,6 +16,11 @@ namespace ferrox::extract {
 
 namespace {
 
+// The library opens its tables by fopen and by no other way, so this program has an fopen of its own, which answers for
+// them from memory and hands all else to the C library. The linker exports it (CMakeLists.txt), or the library would
+// find the C library's first.
+
+/// Where the package poppler-data has them.
 constexpr std::string_view kFolder = "/usr/share/poppler/";
 constexpr const char* kParts[] = {"cMap/Adobe-CNS1", "cMap/Adobe-GB1", "cMap/Adobe-Japan1", "cMap/Adobe-Korea1",
                                   "cidToUnicode"};
@@ -28,6 +33,7 @@ Tables& Held() {
   return *tables;
 }
 
+/// Maps a file for good. What cannot be had is left out, and text that needs it is lost.
 void Hold(const std::string& path) {
   const int fd = open(path.c_str(), O_RDONLY | O_CLOEXEC);
   if (fd < 0) return;

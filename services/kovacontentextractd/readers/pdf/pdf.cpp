@@ -26,6 +26,7 @@ using Document = std::unique_ptr<poppler::document>;
 
 void IgnoreComplaint(const std::string&, void*) {}
 
+/// The library's strings are units of UTF-16.
 std::string Utf8(const poppler::ustring& text) {
   std::string bytes;
   for (const uint16_t unit : text) {
@@ -57,6 +58,7 @@ void AddTime(const char* field, std::string text, Findings& findings) {
   if (const auto seconds = ParseTime(time + zone)) findings.SetInteger(field, *seconds);
 }
 
+/// The document's own properties count more than those of its packet of XMP, which is read first.
 void AddInformation(const poppler::document& document, Findings& findings) {
   AddXmpPacket(Packet(document.metadata()), findings);
   findings.Set("KOVAMDTitle", Utf8(document.get_title()));
@@ -74,6 +76,7 @@ void AddInformation(const poppler::document& document, Findings& findings) {
   if (document.is_encrypted()) findings.Set("KOVAMDSecurityMethod", "Password Encrypted");
 }
 
+/// The text of all pages, and the size of the first one in points.
 void AddPages(const poppler::document& document, Findings& findings) {
   constexpr std::chrono::milliseconds kCpuMax(10000);
   const CpuBudget budget(kCpuMax);

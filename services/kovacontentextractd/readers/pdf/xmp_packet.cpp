@@ -15,6 +15,7 @@ constexpr PropertyField kFields[] = {
     {"language", "KOVAMDLanguages"},
 };
 
+/// A packet in memory.
 class PacketSource : public ByteSource {
  public:
   explicit PacketSource(const std::string& bytes) : bytes_(bytes) {}

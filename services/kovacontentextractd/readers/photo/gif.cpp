@@ -8,7 +8,13 @@ namespace {
 
 using namespace std::literals;
 
-/// What is left of the file. A film may go on for long: what describes it stands at its beginning.
+// A GIF file: "GIF89a" and the size of the screen (10 bytes), flags of the screen (1), two more bytes, a table of
+// colours; then blocks, each with a kind in its first byte: 21 extension, 2C picture, 3B the end. What an extension or
+// a picture holds is cut into pieces of up to 255 bytes. Of the extensions, FE is a comment and FF is of a program,
+// whose name of 11 bytes is the first piece.
+
+/// What is left of the file, read from its beginning. A film may go on for long: what describes it stands at its
+/// beginning.
 class Blocks {
  public:
   explicit Blocks(std::string_view file) : rest_(file.substr(0, kLookedAtBytes)) {}
@@ -21,7 +27,8 @@ class Blocks {
     rest_.remove_prefix(taken.size());
     return taken;
   }
-  /// Of the byte that describes a picture: passes its table of colours.
+  /// Passes a table of colours, which `flags` (of the screen or a picture) announce: 3 bytes for each of 2^(n+1)
+  /// colours, n being the low 3 bits.
   void PassColours(uint8_t flags) {
     if ((flags & 0x80) != 0) (void)Take(3U << ((flags & 7) + 1));
   }
@@ -41,12 +48,14 @@ class Blocks {
   std::string_view rest_;
 };
 
-/// XMP is not cut into pieces: whoever takes its bytes for lengths of pieces arrives at its end nevertheless.
+/// The packet of XMP at the beginning of `rest`, up to its own end mark. It is not cut into pieces; behind it stand 258
+/// bytes that lead a reader of pieces to the end, whichever byte of the packet it took for a length.
 std::string XmpAt(std::string_view rest) {
   const size_t end = rest.find("<?xpacket end"sv);
   return end == std::string_view::npos ? std::string() : std::string(rest.substr(0, end));
 }
 
+/// An extension, behind its first byte.
 void ReadExtension(Blocks& blocks, GifTexts& texts) {
   constexpr uint8_t kComment = 0xFE, kApplication = 0xFF;
   const uint8_t label = blocks.Byte();

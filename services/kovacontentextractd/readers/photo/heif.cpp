@@ -11,6 +11,12 @@ namespace {
 
 using namespace std::literals;
 
+// HEIF and AVIF are rows of boxes (ISO 14496-12): size with this head (4 bytes, 1 for a size of 8 bytes behind the
+// name, 0 for the rest), name (4), content. The box "meta" has the boxes "iinf", the list of items with their types,
+// and "iloc", where in the file the bytes of each item are. EXIF is an item of the type "Exif", XMP one of the type
+// "mime". A box whose content begins with 4 bytes of version (1) and flags (3) is a full box.
+
+/// Of EXIF or XMP, what is taken.
 constexpr size_t kPartMaxBytes = 4U << 20;
 
 /// Numbers off the beginning of what is left; 0 behind its end.
@@ -56,6 +62,7 @@ Box TakeBox(Bytes& bytes) {
   return {name, bytes.Take(size > head ? size - head : 0)};
 }
 
+/// The content of the first box of this name in a row of boxes.
 std::string_view ContentOf(std::string_view boxes, std::string_view name) {
   for (Bytes bytes(boxes); !bytes.Ended();) {
     const Box box = TakeBox(bytes);
@@ -64,7 +71,8 @@ std::string_view ContentOf(std::string_view boxes, std::string_view name) {
   return {};
 }
 
-/// The number of the item that holds EXIF or XMP; 0, which none has, where the list has no such item.
+/// The number of the item that holds EXIF or XMP; 0, which none has, where the list has no such item. An entry ("infe")
+/// is a full box: number (2 bytes, 4 in version 3), protection (2), type (4), name; for "mime", the type of content.
 uint64_t ItemNumber(std::string_view list, bool is_exif) {
   Bytes bytes(list);
   const uint64_t version = bytes.Number(4) >> 24;
@@ -81,7 +89,8 @@ uint64_t ItemNumber(std::string_view list, bool is_exif) {
   return 0;
 }
 
-/// The bytes of an item, which may lie in several pieces of the file.
+/// The bytes of an item, which may lie in several pieces of the file, or from version 1 on in the box "idat". The list
+/// says first, in 4 bits each, how many bytes its offsets, lengths, bases and indices have.
 std::string ItemBytes(std::string_view file, std::string_view meta, uint64_t wanted) {
   Bytes places(ContentOf(meta, "iloc"sv));
   const uint64_t version = places.Number(4) >> 24, sizes = places.Number(2);

@@ -19,6 +19,11 @@ namespace {
 
 enum class Kind { kText, kInteger, kNumber, kShown };
 
+// Cameras write EXIF, a TIFF file of numbered tags; news agencies IPTC, numbered records; programs XMP, properties in
+// XML. A file may have all three, saying the same or not. The library finds and parses them in each container; what is
+// decided here is which of them fills a field.
+
+/// Which key of the library fills which field, and how.
 struct Row {
   const char* key;
   const char* field;
@@ -93,6 +98,7 @@ constexpr Row kCopiedRows[] = {
     {"Xmp.exif.UserComment", "KOVAMDComment"},
 };
 
+/// Fields of several values, to which each source adds.
 bool IsList(const std::string& field) {
   return field == "KOVAMDKeywords" || field == "KOVAMDAuthors" || field == "KOVAMDPeopleDisplayName";
 }
@@ -146,6 +152,7 @@ double NumberOf(const Exiv2::Exifdatum& datum) {
   return number.second != 0 ? static_cast<double>(number.first) / number.second : static_cast<double>(datum.toFloat());
 }
 
+/// The rows of EXIF, and the numbers that only it has.
 void AddExif(const Exiv2::ExifData& exif, Fields& fields, Findings& findings) {
   for (const Row& row : kExifRows) {
     const auto found = exif.findKey(Exiv2::ExifKey(row.key));
@@ -162,6 +169,7 @@ void AddExif(const Exiv2::ExifData& exif, Fields& fields, Findings& findings) {
   }
 }
 
+/// The rows of IPTC or XMP. A key may occur several times, each with a value of its list.
 template <typename Data, typename Key, size_t Count>
 void AddRows(const Data& data, const Row (&rows)[Count], Fields& fields) {
   for (const Row& row : rows) {
@@ -172,6 +180,7 @@ void AddRows(const Data& data, const Row (&rows)[Count], Fields& fields) {
   }
 }
 
+// The text of one key; empty where the file has none. One function for each of the library's three unrelated types.
 std::string TextOf(const Exiv2::ExifData& exif, const char* key) {
   const auto found = exif.findKey(Exiv2::ExifKey(key));
   return found != exif.end() ? found->toString() : std::string();
@@ -226,6 +235,7 @@ void AddExposure(const Exiv2::ExifData& exif, Findings& findings) {
   if (flash != exif.end() && flash->count() > 0) findings.SetInteger("KOVAMDFlashOnOff", flash->toLong() & 1);
 }
 
+/// In dots for an inch; unit 3 means dots for a centimetre.
 void AddResolution(const Exiv2::ExifData& exif, Findings& findings) {
   const auto unit = exif.findKey(Exiv2::ExifKey("Exif.Image.ResolutionUnit"));
   const float inches = unit != exif.end() && unit->count() > 0 && unit->toLong() == 3 ? 2.54F : 1.0F;

@@ -12,12 +12,18 @@ namespace {
 
 using namespace std::literals;
 
+// A PNG file is a mark and chunks: size of the content (4 bytes, high byte first), name (4), content, check sum (4).
+// All but those that hold the picture (IDAT, fdAT) are copied into a file that the library then reads: it would read a
+// picture of hundreds of MiB otherwise.
+
 constexpr std::string_view kMark = "\x89PNG\r\n\x1a\n"sv;
 constexpr size_t kHeadBytes = 8;  // of a chunk: its size and name
 constexpr size_t kCheckBytes = 4;
+/// Of all chunks that are kept; a longer one is left out.
 constexpr size_t kKeptMaxBytes = 16U << 20;
 constexpr int kChunksMax = 200000;
 
+/// The text up to the next zero, which is taken off with it.
 std::string_view TakeText(std::string_view& rest) {
   const std::string_view text = rest.substr(0, rest.find('\0'));
   rest.remove_prefix(std::min(text.size() + 1, rest.size()));

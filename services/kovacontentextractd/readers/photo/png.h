@@ -14,6 +14,7 @@ struct PngParts {
   std::vector<std::pair<std::string, std::string>> texts;  ///< keyword and text, those that are not packed
 };
 
+/// Reads the chunks of a PNG file; a damaged one as far as it goes.
 PngParts ReadPngParts(const Source& source);
 
 }  // namespace ferrox::extract

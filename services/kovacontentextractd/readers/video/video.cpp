@@ -22,12 +22,14 @@ using MediaInfoLib::stream_t;
 
 /// Of a film, what describes it is at its beginning and its end.
 constexpr uint64_t kReadMaxBytes = 64U << 20;
+/// How many times the library may ask for another place of the file.
 constexpr int kJumpsMax = 1000;
 constexpr std::chrono::milliseconds kCpuMax(1500);
 constexpr size_t kPieceBytes = 64U << 10;
 
 enum class Kind { kText, kInteger, kMilliseconds, kTime, kYear };
 
+/// A value of the library by stream and name, and the field that it fills.
 struct Row {
   stream_t stream;
   const wchar_t* name;
@@ -137,6 +139,7 @@ void SetRow(const Row& row, std::string value, Findings& findings) {
   if (row.kind == Kind::kInteger || number <= 9999) findings.SetInteger(row.field, static_cast<int64_t>(number));
 }
 
+/// The tags that programs wrote under names of their own.
 void AddFreeTags(MediaInfo& info, Findings& findings) {
   for (const auto& tag : kFreeTags) {
     for (const wchar_t* name : tag.names) {
@@ -146,6 +149,7 @@ void AddFreeTags(MediaInfo& info, Findings& findings) {
   for (const Row& row : kFreeNumbers) SetRow(row, Value(info, row.stream, 0, row.name), findings);
 }
 
+/// Which kinds of streams there are, their codecs and languages.
 void AddStreams(MediaInfo& info, Findings& findings) {
   constexpr size_t kStreamsMax = 100;
   const struct {
