@@ -259,7 +259,7 @@ struct Row {
 std::unique_ptr<Watcher> MakeFilesystemWatcher(const std::string& cookie) {
   ferrox::notifyd::FilesystemWatcher::Options options;
   options.cookie = cookie;
-  return std::make_unique<ferrox::notifyd::FilesystemWatcher>(std::move(options));
+  return std::make_unique<ferrox::notifyd::FilesystemWatcher>(options);
 }
 
 std::unique_ptr<Watcher> MakeFolderWatcher(std::unique_ptr<ferrox::notifyd::FolderPort> port,

@@ -7,7 +7,9 @@
 
 namespace ferrox::notifyd {
 
-/// Answers one request of the command channel (docs/formats/notifyd.md); never throws. From any thread.
+/// Answers one request of the command channel (docs/formats/notifyd.md): parses it, has the notifier carry it out, and
+/// returns the reply or the failure as JSON text. Never throws. From any thread except the notifier's; a sync blocks
+/// the caller until it is answered.
 std::string HandleCommand(Notifier& notifier, const std::string& request, const services::Peer& peer);
 
 }  // namespace ferrox::notifyd

@@ -18,6 +18,10 @@ namespace ferrox::notifyd {
 /// The daemon's loop, which carries what happens in the registered folders into the queues: the registry says what to
 /// watch, the WatchSet's watchers report changes (OnChange), the QueueRouter appends them to the queues. All of it
 /// belongs to the thread of Run; Sync and Status hand their requests to that thread and wait.
+///
+/// A turn of the loop waits for something to do, then runs requests, reads the registry if it changed, reads the
+/// watchers' changes once a batch has gathered, lets the watchers go on with what takes time, examines the roots if one
+/// was disturbed, and appends what is due. Each part is bounded in time, so that none keeps the others waiting.
 class Notifier : private WatchSet::Listener {
  public:
   struct Options {

@@ -13,8 +13,8 @@ namespace ferrox::notifyd {
 
 /// What one application wants to have written into one queue.
 struct Registration {
-  std::string application;
-  std::string queue;  ///< the full path of the queue's file
+  std::string application;  ///< its name, for the status
+  std::string queue;        ///< the full path of the queue's file
   std::vector<QueueWatch> watches = {};
 };
 
@@ -27,6 +27,7 @@ struct Registry {
   std::map<std::string, std::vector<QueueWatch>> Queues() const;
 };
 
+/// Reads all of the registry from disk. Problems are part of the result; it does not throw for them.
 using ReadRegistry = std::function<Registry()>;
 
 /// Notices changes of the registry's folder (docs/formats/notifyd.md): its files are replaced and removed, not changed.
@@ -46,7 +47,7 @@ class RegistryWatch {
   base::UniqueFd inotify_;
 };
 
-/// The registry as it was last read.
+/// The registry as it was last read. Belongs to one thread.
 class RegistryReader {
  public:
   RegistryReader(std::string folder, ReadRegistry read) : watch_(std::move(folder)), read_(std::move(read)) {}
@@ -55,13 +56,14 @@ class RegistryReader {
   int Fd() const { return watch_.Fd(); }
   /// Reads the registry, and logs the problems that it did not have at the last reading.
   void Read();
+  /// Empty before the first Read.
   const Registry& Current() const { return current_; }
 
  private:
   RegistryWatch watch_;
   ReadRegistry read_;
   Registry current_;
-  std::set<std::string> logged_problems_;
+  std::set<std::string> logged_problems_;  ///< those of current_: each is logged when it appears
 };
 
 }  // namespace ferrox::notifyd

@@ -12,23 +12,24 @@ namespace ferrox::notifyd {
 
 /// What people can see of one registration.
 struct QueueStatus {
+  /// One of its folders.
   struct Watch {
-    std::string path;
+    std::string path;  ///< as registered
     WatchState state;
   };
 
-  std::string queue;
+  std::string queue;  ///< the full path of its file
   std::string application;
   std::vector<Watch> watches;
-  QueueFigures figures;
+  QueueFigures figures;  ///< of the queue, which may be shared by several applications
 };
 
 /// What people can see of the daemon.
 struct NotifierStatus {
   std::vector<QueueStatus> queues = {};
-  uint64_t changes = 0;                    ///< reported by the kernel
-  uint64_t lost = 0;                       ///< how many times the kernel dropped some
-  std::vector<std::string> problems = {};  ///< sentences
+  uint64_t changes = 0;                    ///< reported by the watchers since the start
+  uint64_t lost = 0;                       ///< how many times the kernel dropped some, since the start
+  std::vector<std::string> problems = {};  ///< sentences: unusable settings and registrations, folders not watched
 };
 
 /// Of each registration, in the registry's order.

@@ -63,9 +63,9 @@ class SyncRounds {
 
   std::vector<Cookie> cookies_;
   std::vector<CookieState> states_;  ///< by way
-  std::vector<Request> next_;
-  std::vector<Request> current_;
-  Problems problems_;  ///< of the round under way
+  std::vector<Request> next_;        ///< for the next round
+  std::vector<Request> current_;     ///< of the round under way
+  Problems problems_;                ///< of the round under way
   bool is_running_ = false;
 };
 

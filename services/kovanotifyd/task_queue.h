@@ -28,7 +28,7 @@ class TaskQueue {
   void Close() BASE_EXCLUDES(mutex_);
 
  private:
-  base::UniqueFd wake_;
+  base::UniqueFd wake_;  ///< an eventfd, written to by Post
   base::Mutex mutex_;
   std::vector<Task> tasks_ BASE_GUARDED_BY(mutex_);
   bool is_closed_ BASE_GUARDED_BY(mutex_) = false;

@@ -26,27 +26,33 @@ class ExchangeDetector {
   void Clear() { has_last_ = false; }
 
  private:
-  bool has_last_ = false;
+  bool has_last_ = false;                   ///< whether the last record was a rename
   HandleKey folder_, new_folder_, target_;  ///< of the last record; views of names would not outlive its batch
   std::string name_, new_name_;
 };
 
 /// Turns the kernel's records for whole file systems into changes, in their order. A record names its folder by a key;
 /// the paths are those of the moment of the record (PathFinder), none for a name outside of all roots.
+///
+/// A record may stand for several changes of one name and object, which the kernel joined. A deletion is
+/// reported first. What else the record says follows if the name was not deleted, or is on disk again.
+///
+/// Every move of a folder goes to the FolderLocator, also outside of all roots: it may lead into one later.
 class FanRecordTranslator {
  public:
   /// What the translator shares with the watcher.
   struct Parts {
-    FilesystemMarks& marks;
-    MountedFolders& mounts;
-    RecordQueue& queue;
-    FolderLocator& locator;
-    PathFinder& finder;
-    WatchedRoots& roots;
-    RenameHistory& history;
-    LinkedFiles& linked;
+    FilesystemMarks& marks;  ///< which record is that of the cookie; what the kernel is to leave out
+    MountedFolders& mounts;  ///< whether a name is on disk
+    RecordQueue& queue;      ///< learns of folders that were made and removed at once
+    FolderLocator& locator;  ///< learns of folders that were made or moved
+    PathFinder& finder;      ///< the paths of a name
+    WatchedRoots& roots;     ///< which roots a folder is above
+    RenameHistory& history;  ///< learns of names that may come back
+    LinkedFiles& linked;     ///< whether a change is to be reported by the file's number
   };
 
+  /// The parts are the watcher's, and outlive this one.
   explicit FanRecordTranslator(const Parts& parts) : parts_(parts) {}
 
   /// Not for a record that says that others were lost.

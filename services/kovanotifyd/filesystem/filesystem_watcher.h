@@ -37,6 +37,7 @@ class FilesystemWatcher : public Watcher {
     size_t records_max = 65536;                   ///< that are read ahead; when there are more, changes count as lost
   };
 
+  /// Opens nothing: what the kernel refuses is reported for each root.
   explicit FilesystemWatcher(const Options& options);
 
   const char* Name() const override { return "fanotify"; }
@@ -48,6 +49,7 @@ class FilesystemWatcher : public Watcher {
   uint64_t Watches(const std::string& root) const override { return roots_.Has(root) ? 1 : 0; }
 
  private:
+  // "", or why the root cannot be watched.
   std::string Begin(const std::string& root);
   std::string Locate(const std::string& root, const HandleKey& key);
   void ReleaseUnused(const HandleKey& key);
@@ -56,7 +58,8 @@ class FilesystemWatcher : public Watcher {
   void OnLost(WatchListener& listener);
   void Rest();
 
-  FanGroup group_;
+  // Each part may use those before it.
+  FanGroup group_;  ///< opened with the first root
   MountedFolders mounts_;
   FilesystemMarks marks_;
   RecordQueue queue_;

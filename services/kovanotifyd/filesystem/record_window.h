@@ -23,6 +23,7 @@ class RecordWindow {
   size_t Size() const { return size_; }
   /// The first record. The reference is valid until Pop or Clear, whatever is added.
   const FanRecord& Front() const { return batches_.front().records[at_]; }
+  /// Drops the first record, and the memory of its batch with the last one of it.
   void Pop();
   void Clear();
 
@@ -33,9 +34,9 @@ class RecordWindow {
  private:
   static bool IsRelocation(const FanRecord& record);
 
-  std::deque<FanBatch> batches_;
-  size_t at_ = 0;    ///< the first record's index in the first batch
-  size_t size_ = 0;  ///< records in all batches from there on
+  std::deque<FanBatch> batches_;  ///< none of them empty
+  size_t at_ = 0;                 ///< the first record's index in the first batch
+  size_t size_ = 0;               ///< records in all batches from there on
   std::unordered_map<HandleKey, std::list<const FanRecord*>> relocations_;  ///< by folder, in order
 };
 

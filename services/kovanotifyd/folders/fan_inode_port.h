@@ -22,6 +22,7 @@ class FanInodePort : public FolderPort {
   int Watch(int folder, Wanted wanted, FolderKey& key) override;
   std::string Reason(int error) const override;
   void Unwatch(FolderKey key, const std::string& path) override;
+  /// A mark can only be taken from a folder that is open, and opening one by its key takes privileges.
   bool UnwatchesByPath() const override { return true; }
   bool Read(std::vector<FolderRecord>& records) override;
 
@@ -32,7 +33,7 @@ class FanInodePort : public FolderPort {
   /// Where handles have the file's inode number, by FanGroup::FormOf; as few entries as there are kinds of file
   /// systems.
   std::map<std::string, FanGroup::NumberPlace> number_places_;
-  FanBatch batch_;
+  FanBatch batch_;  ///< of the last Read; the names in its records point into it
 };
 
 }  // namespace ferrox::notifyd

@@ -15,11 +15,16 @@ namespace ferrox::notifyd {
 /// Compares folders of the tree with the disk, one at a time: opens the folder at its path, watches it, and lists it
 /// afterwards, so that nothing that is made in it later can be missed. Works through an InspectionQueue, and adds to it
 /// what comes to be in doubt.
+///
+/// The kernel's key shows which folder was opened: if it is the key that the tree has at that place, nothing is wrong;
+/// if another place of the tree has it, the folder was moved by a record that was not yet read, and the other place is
+/// inspected too. Folders on another mount than their root's are left out of the tree.
 class FolderInspector {
  public:
   using Id = FolderTree::Id;
   using Ref = FolderTree::Ref;
 
+  /// The parts are the watcher's, and outlive this one.
   FolderInspector(FolderTree& tree, KernelWatches& watches, RootLedger& roots, InspectionQueue& queue)
       : tree_(tree), watches_(watches), roots_(roots), queue_(queue) {}
 
@@ -35,7 +40,15 @@ class FolderInspector {
   void RetryUnreadable(Id folder);
 
  private:
-  enum class Finding { kSame, kNew, kOther, kUnreadable, kGone, kRefused };
+  /// What an inspection finds at a folder's path, compared with the tree.
+  enum class Finding {
+    kSame,        ///< the folder that the tree has there
+    kNew,         ///< a folder where the tree had none that is watched
+    kOther,       ///< another folder
+    kUnreadable,  ///< a folder that cannot be opened; it stays in the tree without a key
+    kGone,        ///< nothing that belongs into the tree
+    kRefused,     ///< it cannot be watched, and so neither can the roots over it
+  };
 
   Finding Inspect(Id id, bool relist, std::vector<Ref>& below, WatchListener& listener);
   Finding Watch(Id id, int folder, WatchListener& listener);

@@ -19,6 +19,7 @@ class IdTable {
  public:
   using Hash = std::function<uint32_t(uint32_t id)>;
 
+  /// `hash` gives the hash of what an id stands for; it must stay the same while the id is in the table.
   explicit IdTable(Hash hash);
 
   /// The id for which `matches` holds, which must be one with this hash; kEmpty when there is none.
@@ -29,7 +30,9 @@ class IdTable {
       if (slots_[at] != kErased && matches(slots_[at])) return slots_[at];
     }
   }
+  /// The id must not be in the table yet.
   void Insert(uint32_t id);
+  /// The id must be in the table.
   void Erase(uint32_t id);
 
  private:
@@ -72,8 +75,9 @@ class FolderTree {
   FolderTree(const FolderTree&) = delete;
   FolderTree& operator=(const FolderTree&) = delete;
 
+  /// The folder of that name in `parent`, or kNone.
   Id Child(Id parent, std::string_view name) const;
-  /// The name must not be there yet.
+  /// Adds a folder without a key. The name must not be there yet.
   Id Add(Id parent, std::string_view name);
   /// The folder of an absolute path; what is missing of it is added.
   Id FindOrAdd(std::string_view path);
@@ -82,8 +86,9 @@ class FolderTree {
   /// Removes a folder and all below it, deepest first; `before` is called with each of them. Not for the top.
   void Remove(Id id, const std::function<void(Id)>& before);
 
+  /// The folder with that key, or kNone; kNone also for 0.
   Id ByKey(FolderKey key) const;
-  /// The key must not be another folder's.
+  /// Sets a folder's key, 0 for none. The key must not be another folder's.
   void SetKey(Id id, FolderKey key);
   FolderKey Key(Id id) const { return nodes_[id].key; }
   /// How many folders have a key; and those at and below a folder, which takes a walk through them.
@@ -97,12 +102,14 @@ class FolderTree {
   Id NextSibling(Id id) const { return nodes_[id].next; }
   std::vector<Ref> Children(Id id) const;
   std::string_view Name(Id id) const { return {nodes_[id].name.get(), nodes_[id].name_size}; }
+  /// The full path of a folder, or of a name in it.
   std::string Path(Id id) const;
   std::string Path(Id id, std::string_view name) const;
   /// Whether a folder is `top` or below it.
   bool IsWithin(Id id, Id top) const;
 
   bool Has(Id id, Flag flag) const { return (nodes_[id].flags & flag) != 0; }
+  /// Whether the folder or one above it has the flag.
   bool HasAtOrAbove(Id id, Flag flag) const;
   /// Whether the folder is a root or below one.
   bool IsCovered(Id id) const { return HasAtOrAbove(id, kRoot); }
@@ -115,6 +122,7 @@ class FolderTree {
   Id Get(Ref ref) const;
 
  private:
+  /// A folder, or a free node. Siblings are linked both ways, so that a folder is unlinked without a search.
   struct Node {
     FolderKey key = 0;
     std::unique_ptr<char[]> name;
@@ -138,8 +146,8 @@ class FolderTree {
   Id free_ = kNone;         ///< the first free node
   uint64_t keys_ = 0;
   uint64_t changes_ = 1;
-  IdTable by_place_;
-  IdTable by_key_;
+  IdTable by_place_;  ///< by parent and name
+  IdTable by_key_;    ///< those with a key
 };
 
 }  // namespace ferrox::notifyd

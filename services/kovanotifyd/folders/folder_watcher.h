@@ -26,8 +26,10 @@ namespace ferrox::notifyd {
 ///
 /// The records may lie far behind the disk, so a folder that is opened by its path may be another one than the record
 /// meant: then two places of the tree get the same key, or a folder is inspected whose path a later record changes.
-/// Places in doubt are inspected again once all records have been read, and reported as kUncertain if they are found to
-/// be different.
+/// For example, "a" is made, renamed to "b", and a new "a" is made. At the record of the first "a" the path "a" leads
+/// to the second one, which is watched in its place; the rename then moves it to "b" in the tree, and the first folder
+/// has no watch at all. So each rename puts both its names in doubt. Places in doubt are inspected again once all
+/// records have been read, and reported as kUncertain if they are found to be different.
 class FolderWatcher : public Watcher {
  public:
   struct Options {
@@ -35,6 +37,7 @@ class FolderWatcher : public Watcher {
     uint64_t watches_max = 0;      ///< 0: 80 % of the port's limit
   };
 
+  /// `port` is open and watches nothing. A cookie that cannot be watched is logged; syncs then run into their time-out.
   FolderWatcher(std::unique_ptr<FolderPort> port, const Options& options);
 
   const char* Name() const override { return port_->Name(); }
@@ -46,6 +49,7 @@ class FolderWatcher : public Watcher {
   bool WatchesEachFolder() const override { return true; }
   uint64_t Watches(const std::string& root) const override { return roots_.Watches(root); }
 
+  /// For tests.
   const FolderTree& Folders() const { return tree_; }
 
  private:
@@ -53,6 +57,7 @@ class FolderWatcher : public Watcher {
   bool HasWork() const { return watches_.HasDropped() || queue_.HasWork(); }
   void Step(WatchListener& listener);
 
+  // Each part may use those before it.
   std::unique_ptr<FolderPort> port_;
   FolderTree tree_;
   KernelWatches watches_;

@@ -18,10 +18,12 @@ class InotifyPort : public FolderPort {
   const char* Name() const override { return "inotify"; }
   Limit WatchLimit() const override;
   int Fd() const override { return inotify_.Get(); }
+  /// The key is the watch descriptor, which the kernel gives again only after 2^31 others.
   int Watch(int folder, Wanted wanted, FolderKey& key) override;
   std::string Reason(int error) const override;
   void Unwatch(FolderKey key, const std::string& path) override;
   bool UnwatchesByPath() const override { return false; }
+  /// Waits up to 30 ms for the second half of a move. Its records have no inode numbers.
   bool Read(std::vector<FolderRecord>& records) override;
 
  private:

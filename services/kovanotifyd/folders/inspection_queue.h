@@ -14,6 +14,9 @@ namespace ferrox::notifyd {
 /// where the tree may be wrong, then the walks that set roots up. A name may have to wait until the kernel's records
 /// have all been read, when tree and disk are of the same moment; so may the report of the cookie, which comes after
 /// everything that was in doubt when it was touched.
+///
+/// Folders and names are taken from the end: what an inspection finds below a folder is inspected before its siblings,
+/// so that the queue holds the siblings along one path rather than a whole level of the tree.
 class InspectionQueue {
  public:
   using Id = FolderTree::Id;
@@ -33,6 +36,7 @@ class InspectionQueue {
 
   explicit InspectionQueue(FolderTree& tree) : tree_(tree) {}
 
+  /// Adds a folder that can be inspected now.
   void AddFolder(Ref folder, bool relist) { folders_.push_back({folder, relist}); }
   /// Adds a name for when all records have been read.
   void AddNameInDoubt(Id parent, std::string_view name);
@@ -43,11 +47,14 @@ class InspectionQueue {
   /// The kernel's records have all been read: releases what waited for that.
   void OnAllRead();
 
+  /// Whether a folder or name waits, for its turn or for the records.
   bool HasDoubts() const { return !in_doubt_.empty() || HasUrgent(); }
   bool HasWork() const { return HasDoubts() || !walks_.empty() || cookie_ != Cookie::kNone; }
   /// Folders and names that can be inspected now; the last one added is the first. Folders come before names.
   bool HasUrgent() const { return !folders_.empty() || !names_.empty(); }
+  /// Nothing when only names are left.
   std::optional<Folder> TakeFolder();
+  /// There must be one.
   Name TakeName();
 
   /// Reports the cookie later: TakeCookie is true once, after all that is in doubt now.
@@ -57,6 +64,7 @@ class InspectionQueue {
   /// Begins a walk through all folders of a root, in place of one that is under way.
   void StartWalk(const std::string& root, Ref folder);
   void CancelWalk(const std::string& root);
+  /// Walks take place one after the other; the others of these calls are about the first one.
   bool HasWalk() const { return !walks_.empty(); }
   const std::string& WalkedRoot() const { return walks_.front().root; }
   /// The next folder of the walk under way; nothing at its end.
@@ -68,20 +76,21 @@ class InspectionQueue {
  private:
   struct Walk {
     std::string root;
-    std::vector<Ref> ahead;
+    std::vector<Ref> ahead;  ///< folders that were found and not yet inspected
   };
+  /// What the report of a cookie waits for.
   enum class Cookie { kNone, kAfterAllRead, kAfterInspections };
 
   FolderTree& tree_;
-  std::vector<Folder> folders_;
-  std::vector<Name> names_;
+  std::vector<Folder> folders_;  ///< for TakeFolder
+  std::vector<Name> names_;      ///< for TakeName
   std::deque<Walk> walks_;
   Cookie cookie_ = Cookie::kNone;
 
   // Since all records had last been read:
   std::vector<Name> in_doubt_;
   std::vector<Ref> inspected_;
-  std::vector<Ref> moved_;
+  std::vector<Ref> moved_;  ///< those with FolderTree::kMoved
 };
 
 }  // namespace ferrox::notifyd

@@ -19,6 +19,7 @@ class NameFilter {
   /// `ignore` holds names, and must outlive the filter.
   void AddRoot(const std::vector<std::string>& ignore) { ignored_.push_back(&ignore); }
   bool Wants(std::string_view name) const;
+  /// Whether both are made of equal lists in the same order.
   bool operator==(const NameFilter& other) const;
 
  private:
@@ -44,11 +45,15 @@ class RootPassages {
 /// The roots of a watcher: their names to ignore, the folders of the tree that are there for their sake, and what
 /// becomes of them when such a folder is moved or removed. A root belongs to its path: it does not move with its
 /// folder.
+///
+/// Roots may lie in each other. The folders that several of them cover are in the tree once and have one watch; they
+/// stay as long as one of these roots does and has no name on the way to them to ignore.
 class RootLedger {
  public:
   using Id = FolderTree::Id;
   using Ref = FolderTree::Ref;
 
+  /// The parts are the watcher's, and outlive this one.
   RootLedger(FolderTree& tree, KernelWatches& watches, InspectionQueue& queue)
       : tree_(tree), watches_(watches), queue_(queue), passages_(tree, watches) {}
 
@@ -61,6 +66,7 @@ class RootLedger {
   /// Walks through all roots again: the kernel lost records.
   void WalkAll();
 
+  /// All roots, in ascending order.
   std::vector<std::string> Paths() const;
   /// The roots that the folder is at or below, the innermost first.
   std::vector<std::string> PathsOver(Id id) const;
@@ -79,6 +85,7 @@ class RootLedger {
   void MoveFolder(Id id, Id parent, std::string_view name, WatchListener& listener);
   /// Reports the roots at and below a folder as disturbed.
   void Disturb(Id id, WatchListener& listener) const;
+  /// As RootPassages::Watch; to be called for a root whose folder was inspected.
   void WatchPassages(Id root) { passages_.Watch(root); }
 
  private:

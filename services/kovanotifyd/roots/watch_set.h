@@ -35,9 +35,14 @@ struct WatchState {
 };
 
 /// Decides which folders are roots and in which way each is watched: the first way that does not refuse it, or, when
-/// all refuse, by a comparison of the whole root at intervals. A root whose folder is missing or unusable waits until
-/// there is one. A folder that is there again, or is another one than before, is compared once it is covered; so is one
-/// that was removed, but not one that went away with its volume. Belongs to one thread.
+/// all/// refuse, by a comparison of the whole root at intervals. A root whose folder is missing or unusable waits
+/// until there is one. A folder that is there again, or is another one than before, is compared once it is covered; so
+/// is one that was removed, but not one that went away with its volume. Belongs to one thread.
+///
+/// A root goes from kWaiting to kSettingUp when its folder is usable and a watcher gets it, to kCovered when that
+/// watcher reports OnCovered, and back to kSettingUp after OnLost. OnRefused passes it on to the next way, in the end
+/// to kScanned or kWaiting. Examine takes it back to kWaiting when its folder is gone, or begins anew when it is
+/// another one.
 class WatchSet : private WatchListener {
  public:
   /// Gets what the watchers report of all roots. Called during Follow, Examine, Read, Advance and Scan.
@@ -103,12 +108,12 @@ class WatchSet : private WatchListener {
   std::vector<Way> ways_;
   bool scans_;
   Listener& listener_;
-  size_t active_way_ = 0;
+  size_t active_way_ = 0;  ///< whose watcher is being called by Read or Advance
   MountTable mounts_;
   RootGuard guard_;
-  std::vector<Registration> registrations_;
+  std::vector<Registration> registrations_;  ///< as Follow got them
   RootTable roots_;
-  bool disturbed_ = false;
+  bool disturbed_ = false;  ///< since the last Examine
 };
 
 }  // namespace ferrox::notifyd
