@@ -33,6 +33,7 @@ constexpr Daemon kIndexDaemon = {"the index daemon", kFileIndexdSocket, Error::k
 constexpr Daemon kNotificationDaemon = {"the notification daemon", kNotifydSocket, Error::kInternal};
 constexpr Daemon kContentExtraction = {"content extraction", kContentExtractdSocket, Error::kInternal};
 
+/// Of a daemon that took the connection and let the time pass.
 constexpr char kNoAnswer[] = "does not answer; see its log, or restart it ('fileindexctl down', 'up')";
 
 /// The reply's data, or what the user can do about there being none.
@@ -66,6 +67,7 @@ wire::Reply SendCommand(const Daemon& daemon, const std::string& type, const Jso
   return wire::AskDaemon(daemon.socket, type, data, longest);
 }
 
+/// The engine takes {"command", "data"} and not {"type", "data"}; see docs/formats/engine.md.
 wire::Reply SendToEngine(const std::string& command, const Json::Value& data, std::chrono::seconds longest) {
   Json::Value request;
   request["command"] = command;
@@ -77,6 +79,7 @@ Json::Value AskEngine(const std::string& command, const Json::Value& data, std::
   return DataOf(kEngine, SendToEngine(command, data, longest));
 }
 
+/// A daemon that does not run has neither a status nor a problem: whether that matters depends on what is indexed.
 DaemonState StateFrom(const Daemon& daemon, wire::Reply reply) try {
   if (reply.outcome == Outcome::kNotRunning) return {};
   if (reply.outcome == Outcome::kNoAnswer || reply.outcome == Outcome::kPeerClosed) return {Json::Value(), kNoAnswer};
@@ -85,6 +88,7 @@ DaemonState StateFrom(const Daemon& daemon, wire::Reply reply) try {
   return {Json::Value(), failure.what()};
 }
 
+/// The engine has no command "status"; its answer to "ping" says the same.
 DaemonState EngineState() {
   return StateFrom(kEngine, SendToEngine("ping", Json::Value(Json::objectValue), kStateWait));
 }
@@ -128,6 +132,7 @@ Json::Value AskIndexDaemonIfRunning(const std::string& type, const Json::Value& 
   return reply.outcome == Outcome::kNotRunning ? Json::Value() : DataOf(kIndexDaemon, std::move(reply));
 }
 
+/// One thread for each daemon but the engine, which this one asks. Each thread ends within kStateWait.
 InstanceState AskAll() {
   const auto ask = [](const Daemon& daemon) { return std::async(std::launch::async, &StateOf, std::cref(daemon)); };
   auto index_daemon = ask(kIndexDaemon);
@@ -141,6 +146,7 @@ InstanceState AskAll() {
   return state;
 }
 
+/// Only connects, so that a search is not held up by a daemon that is busy.
 std::string NotNoticed() {
   for (const Daemon& daemon : {kNotificationDaemon, kIndexDaemon}) {
     if (wire::IsServed(InstancePath(daemon.socket))) continue;
@@ -176,6 +182,7 @@ std::map<std::string, std::string> AwaitChanges(const std::vector<std::string>& 
   return behind;
 }
 
+/// Waits less than for other commands: it is asked before anything is changed, so that giving up costs nothing.
 void RequireEngine() { (void)AskEngine("ping", Json::Value(Json::objectValue), kStateWait); }
 
 void RequireIndexDaemon() { (void)AskIndexDaemon("status", Json::Value()); }

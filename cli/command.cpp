@@ -11,6 +11,7 @@ namespace {
 
 const Option kHelpOption = {"--help", nullptr, "this text"};
 
+/// Null for an option that the command does not have. Every command has "--help".
 const Option* FindOption(const Command& command, const std::string& name) {
   for (const Option& option : command.options) {
     if (name == option.name) return &option;
@@ -18,8 +19,10 @@ const Option* FindOption(const Command& command, const std::string& name) {
   return name == kHelpOption.name ? &kHelpOption : nullptr;
 }
 
+/// "[=N]": the value may be left out, and so only "=" can give it; the next word is never taken for it.
 bool IsOptional(const char* value) { return value[0] == '['; }
 
+/// Where the table lists the values ("name|date"), only these are taken. Other values the command checks itself.
 void CheckChoice(const Option& option, const std::string& given) {
   const std::string value = option.value;
   if (value.find('|') == std::string::npos) return;
@@ -59,6 +62,7 @@ struct WordLimits {
   size_t most = 0;
 };
 
+/// As a usage line shows it: "--limit N", "--fresh[=SECONDS]".
 std::string OptionText(const Option& option) {
   if (option.value == nullptr) return option.name;
   return std::string(option.name) + (IsOptional(option.value) ? "" : " ") + option.value;
@@ -86,6 +90,7 @@ long long Arguments::Number(const std::string& name, long long otherwise, long l
   const std::string text = Get(name);
   char* end = nullptr;
   errno = 0;
+  // strtoll stops at the first byte that is no digit; only a text that is a number as a whole counts.
   const long long number = strtoll(text.c_str(), &end, 10);
   if (text.empty() || *end != '\0' || errno != 0 || number < least || number > most) {
     throw UsageError(name + " takes a number from " + std::to_string(least) + " to " + std::to_string(most));
@@ -93,6 +98,8 @@ long long Arguments::Number(const std::string& name, long long otherwise, long l
   return number;
 }
 
+/// Options may stand anywhere among the words, and an option that is given twice has its last value. With "--help" the
+/// number of words does not matter.
 Arguments ParseArguments(const Command& command, const std::vector<std::string>& given) {
   Arguments arguments;
   bool options_ended = false;

@@ -7,22 +7,26 @@
 
 namespace ferrox::cli {
 
-/// kIncomplete: something that was asked for was left out, or may not be up to date.
+/// How a command ends, for scripts; the manual lists them. kIncomplete: what was shown is right, but something that was
+/// asked for was left out, or may not be up to date. kNothingFound is no failure: the search worked.
 enum ExitCode { kDone = 0, kNothingFound = 1, kWrongUsage = 2, kFailure = 3, kIncomplete = 4, kNotPermitted = 5 };
 
-/// The command line cannot be understood: exit code 2.
+/// The command line cannot be understood: exit code 2. The sentence says what is wrong with it; main() adds the usage
+/// line of the command.
 class UsageError : public std::runtime_error {
  public:
   using std::runtime_error::runtime_error;
 };
 
-/// Something went wrong; the sentence names the thing and the remedy: exit code 3.
+/// Something went wrong; the sentence names the thing and the remedy: exit code 3. An Error of the library that reaches
+/// main() ends the tool alike, in the words of Explain.
 class Failure : public std::runtime_error {
  public:
   using std::runtime_error::runtime_error;
 };
 
-/// The same, where a daemon refused: its error code, and its sentence alone.
+/// The same, where a daemon refused what it was asked: its error code, and its sentence without the daemon's name, for
+/// commands that go on with other shares or know a better remedy.
 class Refusal : public Failure {
  public:
   Refusal(const std::string& daemon, int code, const std::string& reason)
@@ -35,14 +39,16 @@ class Refusal : public Failure {
   std::string reason_;
 };
 
-/// The calling user may not do it; the sentence says what, and what to do: exit code 5. No Failure: who goes on after
-/// one does not go on after this.
+/// The calling user may not do it; the sentence says what, and what to do: exit code 5. No Failure: a command that goes
+/// on after the failure of one share does not go on after this, since the next share would fail in the same way.
 class NotPermitted : public std::runtime_error {
  public:
   using std::runtime_error::runtime_error;
 };
 
-/// What a command needs of the instance; each also what stands before it, but for the table of shares.
+/// What a command needs of the instance, which main() sees to before it runs the command: rights are asked for, folders
+/// are made. Each includes what stands before it, but for the table of shares, which kService and kInstance can do
+/// without: the daemons can be steered and paused while the table is being mended.
 enum class Needs {
   kNothing,
   kReading,   ///< to read its settings
@@ -61,10 +67,10 @@ struct Option {
   const char* help;
 };
 
-/// What was given to a command.
+/// What was given to a command, sorted by ParseArguments.
 struct Arguments {
-  std::vector<std::string> words;
-  std::map<std::string, std::string> options;
+  std::vector<std::string> words;              ///< in their order, the command's own name not among them
+  std::map<std::string, std::string> options;  ///< by name, "--limit"; "" for one that takes no value
 
   bool Has(const std::string& name) const { return options.count(name) != 0; }
   std::string Get(const std::string& name, const std::string& otherwise = "") const;
@@ -72,13 +78,13 @@ struct Arguments {
   long long Number(const std::string& name, long long otherwise, long long least, long long most) const;
 };
 
-/// One row of the table of commands.
+/// One row of the table of commands (command_table.h). Parsing, help, usage lines and completion all go by it.
 struct Command {
   const char* name;   ///< one or two words
   const char* words;  ///< as in the usage line: "SHARE [FOLDER]", "PATH..."; the names choose what is completed
   std::vector<Option> options;
   const char* help;
-  int (*run)(const Arguments& arguments);
+  int (*run)(const Arguments& arguments);  ///< @return an ExitCode; throws what main() turns into one
   Needs needs = Needs::kReading;
 };
 

@@ -23,6 +23,8 @@
 #include "fileindex/operations/index_mgr.h"
 #include "fileindex/util.h"
 
+/// The list of indexed folders: adding, changing, deleting and showing its entries. The library does it; here paths are
+/// understood as people give them, entries that are there already keep what is not changed, and failures are explained.
 namespace ferrox::cli {
 
 namespace {
@@ -31,6 +33,7 @@ using fileindex::FolderMgr;
 
 constexpr char kQueueFolder[] = "/var/lib/kova/fileindex/queue";
 
+/// All of them before anything is changed: one that means no folder ends the command.
 std::vector<std::string> SharePaths(const Arguments& arguments, const FolderMgr& configured) {
   std::vector<std::string> paths;
   for (const std::string& word : arguments.words) paths.push_back(ToSharePath(word, configured));
@@ -72,6 +75,8 @@ void RequireNoFiles(const std::vector<std::string>& paths) {
   }
 }
 
+/// Adds or changes folders with one call of the library, so that all of them are changed or none. The engine is asked
+/// first, since the index of a new share is made before the folders file is saved.
 int Upsert(const Arguments& arguments, const Kinds& kinds, void (*upsert)(const Json::Value&, bool)) {
   const FolderMgr configured;
   const std::vector<std::string> paths = SharePaths(arguments, configured);
@@ -86,6 +91,8 @@ int Upsert(const Arguments& arguments, const Kinds& kinds, void (*upsert)(const 
   return kDone;
 }
 
+/// Two lines for people: the path, and below it the kinds, the name where it is another than the path's last part, the
+/// pause, and the state where it was asked for.
 std::string FolderText(const Json::Value& folder) {
   std::string text = EscapeForTerminal(TextOf(folder, "path")) + "\n    " + Kinds(folder).Text();
   const std::string name = TextOf(folder, "name");
@@ -126,15 +133,18 @@ bool AddStates(Json::Value& folders, const Json::Value& with_states) {
 
 }  // namespace
 
+/// Refused for a folder that is in the list already (kDuplicatedFolder); the remedy names "folder set".
 int RunFolderAdd(const Arguments& arguments) {
   return Upsert(arguments, Kinds(arguments.Get("--kinds", "all")), &fileindex::FolderAdd);
 }
 
+/// A change without --kinds would switch all kinds on, which is hardly meant.
 int RunFolderSet(const Arguments& arguments) {
   if (!arguments.Has("--kinds")) throw UsageError("--kinds is needed: of which kinds of files to index the content");
   return Upsert(arguments, Kinds(arguments.Get("--kinds")), &fileindex::FolderSet);
 }
 
+/// Both daemons are needed: without them the index or the worker of a share would stay behind.
 int RunFolderDelete(const Arguments& arguments) {
   const std::vector<std::string> paths = SharePaths(arguments, FolderMgr());
   RequireEngine();
@@ -163,6 +173,7 @@ int RunFolderReindex(const Arguments& arguments) {
   return kDone;
 }
 
+/// No daemon need run, and the share need not be there: an entry of the list stands for itself.
 int RunFolderGet(const Arguments& arguments) {
   Json::Value folder;
   fileindex::FolderGet(folder, ToSharePath(arguments.words[0], FolderMgr()));
@@ -174,6 +185,9 @@ int RunFolderGet(const Arguments& arguments) {
   return kDone;
 }
 
+/// The page is read without states first: the library leaves a folder out of which it cannot tell the state, and here
+/// it is shown nevertheless. Two readings may differ when somebody changes the list in between; AddStates goes by the
+/// paths.
 int RunFolderList(const Arguments& arguments) {
   constexpr long long kMost = fileindex::kFileIndexFoldersMax;
   const auto offset = static_cast<unsigned>(arguments.Number("--offset", 0, 0, kMost));

@@ -23,23 +23,29 @@
 #include "fileindex/util.h"
 #include "sdk/share.h"
 
+/// Comparing a share with its index, making the index anew, and waiting for either. A comparison is an event in the
+/// share's queue, which the index daemon carries out when it comes to it; the tool asks the daemon for its status to
+/// see how far it is.
 namespace ferrox::cli {
 
 namespace {
 
 using SteadyClock = std::chrono::steady_clock;
 
+/// How long between two looks at the daemon's status.
 constexpr int kPollMs = 100;
 /// An error, or waiting for something else, that lasts so long is told; the daemon itself goes on trying.
 constexpr std::chrono::seconds kErrorPatience(5);
 constexpr std::chrono::seconds kWaitPatience(30);
 
+/// What a comparison is about: the share's name, its folder, and the queue into which its events go.
 struct Share {
   std::string name;
   std::string path;
   std::string queue_path;
 };
 
+/// @throws Error kNoSuchShare; Failure when no folder of it is indexed.
 Share OpenShare(const std::string& name) {
   const sdk::SDKShare share(IndexedShare(name));
   return {name, share.GetPath(), share.GetQueuePath()};
@@ -55,8 +61,11 @@ void QueueReindex(const Share& share) {
   NotifySettingChanged(share.name);
 }
 
+/// The index daemon's entry of the share; null when it does not work on it. @throws Failure when it does not answer.
 Json::Value ShareStatusOf(const std::string& name) { return ShareIn(AskIndexDaemon("status", Json::Value()), name); }
 
+/// Whether a comparison is still to come or goes on: a rebuild, the bit in the status file, or the event in the queue.
+/// A queue that cannot be read is taken for done only when the worker has nothing to do.
 bool ReindexIsPending(const Share& share, const Json::Value& status) {
   if (status["index"].isObject() && status["index"].isMember("rebuilding")) return true;
   if ((fileindex::StatusMgr().GetShareStatus(share.name) & fileindex::StatusMgr::kNeedReindex) != 0) return true;
@@ -67,11 +76,13 @@ bool ReindexIsPending(const Share& share, const Json::Value& status) {
   }
 }
 
+/// Why the index daemon has no entry of the share.
 [[noreturn]] void ThrowNotWorkedOn(const std::string& share) {
   if (IsPaused(share)) throw Failure("share " + share + " is paused; 'fileindexctl share resume' goes on with it");
   throw Failure("the index daemon does not index " + share + "; 'fileindexctl down' and 'up' make it look again");
 }
 
+/// A pause of everything: no use to wait for its end.
 [[noreturn]] void ThrowPaused(const std::string& share) {
   const long long until = fileindex::StatusMgr().GetPauseInfo();
   throw Failure("indexing is paused" + (until > 0 ? " until " + Date(until) : "") + "; share " + share +
@@ -99,12 +110,15 @@ Json::Value WaitUntilDone(const Share& share) {
   }
 }
 
+/// By how much a count has grown. The daemon counts from its start: a count that is smaller than before began anew
+/// meanwhile.
 uint64_t Grown(const Json::Value& before, const Json::Value& after, const char* key) {
   const uint64_t old_value = UintOf(before, key);
   const uint64_t new_value = UintOf(after, key);
   return new_value >= old_value ? new_value - old_value : new_value;
 }
 
+/// Shows what the comparison did as the difference of the daemon's counts before and after it.
 int ReindexAndWait(const Share& share) {
   const auto begin = SteadyClock::now();
   const Json::Value before = ShareStatusOf(share.name);
@@ -119,6 +133,7 @@ int ReindexAndWait(const Share& share) {
 
 }  // namespace
 
+/// Without --wait the queue is all that is needed, and the daemon may be away.
 int RunIndex(const Arguments& arguments) {
   const Share share = OpenShare(arguments.words[0]);
   if (arguments.Has("--wait")) return ReindexAndWait(share);
@@ -143,6 +158,7 @@ int RunRebuild(const Arguments& arguments) {
   return kDone;
 }
 
+/// One share after the other, so that one whose index cannot be used costs only its own suggestions.
 int RunSuggestRefresh(const Arguments& arguments) {
   const std::vector<std::string> shares = IndexedShares(arguments.words);
   if (shares.empty()) {

@@ -28,6 +28,7 @@ using fileindex::FolderMgr;
 
 constexpr char kHomes[] = "homes";
 
+/// The table of commands lists the values, so that no other comes here.
 AUTH_TYPE Accounts(const Arguments& arguments) {
   const std::string accounts = arguments.Get("--accounts", "local");
   return accounts == "domain" ? AUTH_DOMAIN : accounts == "ldap" ? AUTH_LDAP : AUTH_LOCAL;
@@ -83,6 +84,8 @@ void RefuseActive(const std::string& share) {
 
 }  // namespace
 
+/// The library changes nothing for a share without folders; here that is said. A pause of a share that is paused does
+/// no harm and is reported as such.
 int RunSharePause(const Arguments& arguments) {
   const std::string name = IndexedShare(arguments.words[0]);
   RequireDaemons();
@@ -105,6 +108,8 @@ int RunShareResume(const Arguments& arguments) {
   return ChangeAndReport(resume, "share " + name + " was not paused");
 }
 
+/// Forgets also what is left of a share that is in no table any more, where the queue is found by the folder alone. Of
+/// an existing share only one that is paused is forgotten.
 int RunShareForget(const Arguments& arguments) {
   const std::string& name = arguments.words[0];
   const bool known = IsShare(name);
@@ -125,6 +130,8 @@ int RunShareForget(const Arguments& arguments) {
   return code;
 }
 
+/// Queues a comparison of the share's recycle bin, for the moment after it was switched on or off: nothing in it is
+/// indexed as long as it is one.
 int RunShareCheckRecycle(const Arguments& arguments) {
   const std::string name = IndexedShare(arguments.words[0]);
   fileindex::ShareCheckRecycle(name);
@@ -132,16 +139,19 @@ int RunShareCheckRecycle(const Arguments& arguments) {
   return kDone;
 }
 
+/// The recycle bins of the homes of one kind of accounts.
 int RunHomeEnable(const Arguments& arguments) {
   const AUTH_TYPE accounts = Accounts(arguments);
   return CompareHomes([&] { fileindex::HomeEnable(accounts); },
                       [&](KLIBCSzList** list) { return KOVARecycleHomeEnumRecyclePathForAuthType(list, accounts); });
 }
 
+/// Those of all kinds, whichever was switched off: the library compares all.
 int RunHomeDisable(const Arguments& arguments) {
   return CompareHomes([&] { fileindex::HomeDisable(Accounts(arguments)); }, &KOVARecycleHomeEnumRecyclePath);
 }
 
+/// Called after the platform has renamed the user and the home folder, which is checked.
 int RunUserRename(const Arguments& arguments) {
   const std::string& old_name = arguments.words[0];
   const std::string& new_name = arguments.words[1];

@@ -14,14 +14,17 @@
 #include "common/json_util.h"
 #include "fileindex/optree/optree.h"
 
+/// A look into a queue file: which operations wait in it, when a change does not appear in the index.
 namespace ferrox::cli {
 
 namespace {
 
+/// Behind whatever is wrong with the path.
 constexpr char kRemedy[] = "; give the path of a share's queue file";
 
 using OpPtr = std::shared_ptr<fileindex::OP>;
 
+/// The reader of queues takes a missing file for an empty queue; here a path that was mistyped must not pass for one.
 void CheckReadable(const std::string& path) {
   struct stat status = {};
   const bool there = stat(path.c_str(), &status) == 0;
@@ -44,6 +47,7 @@ void RequireQueue(const std::string& path) {
   if (!beginning.empty()) throw Failure(path + " is no queue file: no line at its beginning is an event" + kRemedy);
 }
 
+/// The text that the library logs.
 void PrintOpAsText(const OpPtr& op) {
   std::ostringstream text;
   text << op;
@@ -59,6 +63,8 @@ void PrintOpAsJson(const OpPtr& op) {
 
 }  // namespace
 
+/// Reads a queue, live or detached, as the index daemon would, and prints the operations that its lines come to.
+/// Nothing is changed, and no instance is needed. The count goes to standard error, behind all operations.
 int RunQueueShow(const Arguments& arguments) {
   const std::string& path = arguments.words[0];
   CheckReadable(path);

@@ -18,6 +18,8 @@
 #include "sdk/share.h"
 #include "wire/fields.h"
 
+/// Searching. The engine answers for the indices that it is given; which those are, whether they are up to date, and
+/// what is missing from the answer is worked out here, so that an answer that is not complete never looks complete.
 namespace ferrox::cli {
 
 namespace {
@@ -31,6 +33,7 @@ constexpr char kMarkStart = '\x02';
 constexpr char kMarkEnd = '\x03';
 constexpr char kWithoutFresh[] = "Without --fresh, or with --partial, the search shows what is indexed by now.";
 
+/// The query as one text. The shell has taken one pair of quotes away: a phrase is given as '"a phrase"'.
 std::string JoinWords(const std::vector<std::string>& words) {
   std::string query;
   for (const std::string& word : words) query += (query.empty() ? "" : " ") + word;
@@ -47,6 +50,8 @@ struct Scope {
   LeftOut left_out;
 };
 
+/// @throws Error kNoSuchShare for a --share that is not there. A list of folders that is damaged keeps nobody from
+/// searching.
 Scope ReadScope(const Arguments& arguments) {
   Scope scope;
   if (arguments.Has("--share")) {
@@ -63,6 +68,7 @@ Scope ReadScope(const Arguments& arguments) {
   return scope;
 }
 
+/// Checks the options, too, so that wrong usage is found before anything waits. @throws UsageError.
 Json::Value SearchRequest(const Arguments& arguments, const Scope& scope) {
   Json::Value data;
   data["query"] = JoinWords(arguments.words);
@@ -78,12 +84,15 @@ Json::Value SearchRequest(const Arguments& arguments, const Scope& scope) {
   return data;
 }
 
+/// In one word. What is no folder goes by its extension, as it does for the choice of what is read.
 std::string KindOf(const Json::Value& fields, const std::string& path) {
   constexpr const char* kKinds[] = {"document", "audio", "video", "image", "other"};
   if (BoolOf(fields, fileindex::elastic::kKOVAMDIsDir)) return "folder";
   return kKinds[fileindex::GetFileTypeByFullPath(path)];
 }
 
+/// A part of the text with the matches shown: bold on a terminal, in brackets elsewhere. The text comes from files and
+/// is escaped between the marks, so that no file can draw on the terminal.
 std::string ShowSnippet(const std::string& snippet, bool on_terminal) {
   std::string shown;
   std::string part;
@@ -104,6 +113,7 @@ std::string ShowSnippet(const std::string& snippet, bool on_terminal) {
   return shown.substr(0, shown.size() - end);
 }
 
+/// The path, what matched in the text, and a line of facts.
 void PrintHit(const Json::Value& hit, bool on_terminal) {
   const Json::Value& fields = hit["fields"];
   const std::string path = TextOf(hit, "doc_id");
@@ -116,6 +126,7 @@ void PrintHit(const Json::Value& hit, bool on_terminal) {
                Date(IntOf(fields, fileindex::elastic::kKOVAMDFSContentChangeDate)).c_str());
 }
 
+/// How many were found, which of them are shown, and how long the engine took.
 void PrintSummary(const Json::Value& result, uint64_t offset) {
   const uint64_t total = UintOf(result, "total");
   const auto shown = static_cast<uint64_t>(result["hits"].size());
@@ -126,6 +137,7 @@ void PrintSummary(const Json::Value& result, uint64_t offset) {
                result["ranking_bounded"].asBool() ? "; so many match that only a part was ranked" : "");
 }
 
+/// On standard error, with words of the index that are spelt alike.
 void PrintNothingFound(const Json::Value& result, const Scope& scope) {
   if (!scope.searched) return;
   std::string similar;
@@ -161,6 +173,7 @@ bool IsFresh(const Arguments& arguments, Scope& scope) try {
   return goes_on;
 }
 
+/// A query that cannot be understood is wrong usage, not a failure of the engine.
 Json::Value Ask(const Json::Value& request) try { return Search(request); } catch (const Refusal& refusal) {
   if (refusal.Code() != Error::kEngineBadRequest) throw;
   throw UsageError(EscapeForTerminal(refusal.Reason()));  // the words themselves cannot be understood
@@ -184,6 +197,8 @@ Json::Value SearchIn(const Arguments& arguments, Scope& scope) {
 
 }  // namespace
 
+/// Results on standard output; on standard error what may be missing from them: shares that were left out, daemons that
+/// do not run. The exit code says so, too, unless --partial makes do with what there is.
 int RunSearch(const Arguments& arguments) {
   Scope scope = ReadScope(arguments);
   const Json::Value request = SearchRequest(arguments, scope);

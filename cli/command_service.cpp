@@ -15,10 +15,13 @@
 #include "platform/host/child_service.h"
 #include "services/support/daemon.h"
 
+/// Starting and stopping the daemons, and pausing what they do. Where the host has a service manager it does the work;
+/// elsewhere the daemons are children of the tool's, and a supervisor starts again what was killed.
 namespace ferrox::cli {
 
 namespace {
 
+/// A daemon, and how the platform starts and stops it; two kinds of functions for two kinds of services.
 struct Service {
   const char* name;
   const char* label;
@@ -38,11 +41,13 @@ constexpr Service kServices[] = {
 
 constexpr Service kSupervisor = {"fileindex-supervisor", "supervisor", nullptr, nullptr, 0};
 
+/// The platform says only that it failed; the host keeps why.
 [[noreturn]] void ThrowProblem(const Service& service, const char* what) {
   const std::string reason = kova::host::LastServiceProblem();
   throw Failure(std::string("the ") + service.label + " could not be " + what + (reason.empty() ? "" : ": " + reason));
 }
 
+/// As the daemons' lines are written.
 void ReportSupervisor(const char* what) { (void)printf("%s: %s\n", kSupervisor.label, what); }
 
 /// systemd does it itself.
@@ -53,6 +58,7 @@ void StartSupervisor() {
   ReportSupervisor(ran ? "runs already" : "started");
 }
 
+/// Says nothing when there was none.
 void StopSupervisor() {
   if (kova::host::HasServiceManager()) return;
   const bool ran = kova::host::ChildServicePid(kova::host::kSupervisor) != 0;
@@ -75,6 +81,8 @@ int ReportPause(void (*change)(int hours), int hours, const std::string& report)
 
 }  // namespace
 
+/// In the order of the table, each when the one before it answers. One that runs already is left alone, so that the
+/// command also mends an instance of which a part has stopped.
 int RunUp(const Arguments& arguments) {
   services::GuardLockFiles();
   if (arguments.Has("--no-supervisor")) StopSupervisor();
@@ -87,6 +95,7 @@ int RunUp(const Arguments& arguments) {
   return kDone;
 }
 
+/// In the opposite order, so that each stops while those that it needs still answer.
 int RunDown(const Arguments&) {
   StopSupervisor();  // first, or it would start them again
   for (size_t i = std::size(kServices); i-- > 0;) {
@@ -109,6 +118,8 @@ int RunPrepare(const Arguments&) {
   return kDone;
 }
 
+/// The hours are a word and not an option; they are checked as if they were one. The status file has the deadline: a
+/// daemon that starts later takes it from there.
 int RunPause(const Arguments& arguments) {
   const std::string hours = arguments.words.empty() ? "0" : arguments.words[0];
   Arguments checked;

@@ -21,6 +21,8 @@
 #include "platform/host/share_rules.h"
 #include "sdk/share.h"
 
+/// The table of shares: adding, listing and removing. A share and its index are changed together, so that neither is
+/// left without the other: what fails half way is taken back, or the same command finishes it.
 namespace ferrox::cli {
 
 namespace {
@@ -59,6 +61,8 @@ std::string OuterOf(const std::string& path) {
   return outer;
 }
 
+/// First the folders, as long as the share can still be asked for; then what the engine and the daemons have of it; the
+/// table last, so that the command can be repeated after a failure.
 void RemoveShare(const std::string& name) {
   (void)OwnShare(name, "remove");
   const std::string queue_path = sdk::SDKShare(name).GetQueuePath();
@@ -136,6 +140,8 @@ void PrintNesting(const kova::host::ShareEntry& added) {
 
 }  // namespace
 
+/// A share that is there already with the same folder is no failure: where nothing of it is indexed yet, all of it
+/// is from now on.
 int RunShareAdd(const Arguments& arguments) {
   kova::host::ShareEntry entry;
   entry.path = RealFolder(arguments.words[0]);
@@ -151,6 +157,7 @@ int RunShareAdd(const Arguments& arguments) {
   return kDone;
 }
 
+/// Those of the host's table and of the file-sharing service.
 int RunShareList(const Arguments& arguments) {
   const auto shares = kova::host::ListShares();
   Json::Value list(Json::arrayValue);
@@ -170,6 +177,7 @@ int RunShareList(const Arguments& arguments) {
   return shares.empty() ? kNothingFound : kDone;
 }
 
+/// See RemoveShare, which 'share add --replace' uses, too.
 int RunShareRemove(const Arguments& arguments) {
   RemoveShare(arguments.words[0]);
   return kDone;

@@ -39,9 +39,11 @@ namespace {
 
 using kova::host::ShareEntry;
 
+/// The daemon's worker is waited for: 3 s in all.
 constexpr int kWorkerLooks = 15;
 constexpr std::chrono::milliseconds kWorkerPause(200);
 
+/// From where to where; the names are equal in a migration.
 struct Move {
   std::string old_name;
   std::string new_name;
@@ -49,6 +51,7 @@ struct Move {
   std::string new_path;
 };
 
+/// Their paths in the table would not be right any more.
 void RefuseSharesBelow(const ShareEntry& entry) {
   for (const ShareEntry& other : kova::host::ListShares()) {
     if (other.name != entry.name && base::IsBelow(other.path, entry.path)) {
@@ -83,6 +86,8 @@ bool RenameFolder(const std::string& from, const std::string& to) {
   return true;
 }
 
+/// The folder first: the table takes only a folder that is there. When the table refuses, the folder gets its old name
+/// back, unless somebody else gave it the new one.
 void RenameInTable(const Move& move) {
   const bool renamed_here = RenameFolder(move.old_path, move.new_path);
   try {
@@ -110,6 +115,7 @@ void RenameIndex(const Move& move) {
   fileindex::StatusMgr().ClearShareStatus(move.old_name);
 }
 
+/// Whether the index daemon works on the share at its new place.
 bool HasWorkerAt(const Json::Value& daemon, const Move& move) {
   return TextOf(ShareIn(daemon, move.new_name), "path") == move.new_path;
 }
@@ -176,6 +182,7 @@ Move RenamedBefore(const std::string& from, const std::string& to) {
   return move;
 }
 
+/// The whole way, of a share that has its old name still. @throws Failure; Error kNoSuchShare.
 Move RenameHere(const std::string& from, const std::string& to) {
   const ShareEntry own = OwnShare(from, "rename");
   if (IsShare(to)) throw Failure("there is a share \"" + to + "\" already; choose another name");
@@ -187,6 +194,8 @@ Move RenameHere(const std::string& from, const std::string& to) {
 
 }  // namespace
 
+/// Where the old name is gone and the new one there, an earlier run or the file-sharing service has renamed the share,
+/// and only what follows is left to do.
 int RunShareRename(const Arguments& arguments) {
   const std::string& from = arguments.words[0];
   const std::string& to = arguments.words[1];
@@ -203,6 +212,8 @@ int RunShareRename(const Arguments& arguments) {
   return kDone;
 }
 
+/// The files have been moved by other means. With --from the place they came from is given when the table already has
+/// the new one.
 int RunShareMigrate(const Arguments& arguments) {
   const std::string& name = arguments.words[0];
   const std::string here = sdk::SDKShare(name).GetPath();

@@ -19,6 +19,8 @@
 #include "sdk/share.h"
 #include "wire/fields.h"
 
+/// What the index holds of single files, and which files it holds without their content. Fields of documents are named
+/// in wire/fields.h; those that begin with "_KOVA" are the service's own.
 namespace ferrox::cli {
 
 namespace {
@@ -39,12 +41,14 @@ constexpr const char* kShownElsewhere[] = {kPathField,     "KOVAMDParent",      
                                            kErrorField,    kVersionField,          "_KOVANeedMeta",
                                            "_KOVAStamp",   "_KOVATextEncoding",    kCutField};
 
+/// Documents of the share's index that a query asks for (docs/formats/engine.md).
 Json::Value Entries(const std::string& share, Json::Value query) {
   Json::Value data = IndexOf(share);
   data["query"] = std::move(query);
   return AskEngine("document_get_by_query", data);
 }
 
+/// The document at one path. Without `field` it comes with all of its members but the text, which may be large.
 Json::Value QueryOf(const std::string& path, const char* field = nullptr) {
   Json::Value query;
   query["qsl"]["term"][kPathField] = path;
@@ -60,6 +64,7 @@ std::string FriendlyName(const std::string& field) {
   return field;
 }
 
+/// Fields that end in "Date" hold seconds; an array is shown as one line.
 std::string FriendlyValue(const std::string& field, const Json::Value& value) {
   const bool is_date = field.size() > 4 && field.compare(field.size() - 4, 4, "Date") == 0;
   if (is_date && value.isInt64()) return Date(value.asInt64());
@@ -70,6 +75,7 @@ std::string FriendlyValue(const std::string& field, const Json::Value& value) {
   return joined;
 }
 
+/// One field, indented below the path. `value` is escaped already.
 void PrintLine(const std::string& name, const std::string& value) {
   (void)printf("    %s: %s\n", EscapeForTerminal(name).c_str(), value.c_str());
 }
@@ -86,6 +92,7 @@ std::string Reading(const Json::Value& document) {
   return IntOf(document, kVersionField) == 0 ? "no reader for this type" : "read" + reader;
 }
 
+/// The size of the text and its beginning, cut between two characters.
 void PrintText(const Json::Value& document, const std::string& text) {
   if (text.empty()) return;
   const std::string encoding = TextOf(document, "_KOVATextEncoding");
@@ -97,6 +104,7 @@ void PrintText(const Json::Value& document, const std::string& text) {
   (void)printf("        %s%s\n", EscapeOneLine(text.substr(0, end)).c_str(), end < text.size() ? " ..." : "");
 }
 
+/// Everything that the index has of the file, the fields under short names.
 void PrintDocument(const Json::Value& document, const std::string& text) {
   (void)printf("%s\n", EscapeForTerminal(TextOf(document, kPathField)).c_str());
   PrintLine("content", Reading(document));
@@ -136,6 +144,7 @@ bool Show(const std::string& file, const Arguments& arguments, LeftOut& left_out
   return true;
 }
 
+/// One file with the reason that the reader gave.
 void PrintUnread(const Json::Value& document, bool json) {
   if (!json) {
     (void)printf("%s\n    %s\n", EscapeForTerminal(TextOf(document, kPathField)).c_str(),
@@ -150,6 +159,8 @@ void PrintUnread(const Json::Value& document, bool json) {
   PrintJson(line);
 }
 
+/// Page by page, each going on behind the path at which the last one ended, so that memory does not grow with the
+/// share. @return how many there are.
 uint64_t ListUnread(const std::string& share, bool json) {
   uint64_t count = 0;
   Json::Value query;
@@ -192,6 +203,7 @@ uint64_t ListLeftOut(const Json::Value& daemon, const std::string& share, bool j
 
 }  // namespace
 
+/// All files are shown, also behind one that is not in the index.
 int RunShow(const Arguments& arguments) {
   bool all = true;
   LeftOut left_out;
@@ -201,6 +213,8 @@ int RunShow(const Arguments& arguments) {
   return all ? kDone : kNothingFound;
 }
 
+/// All shares with folders, unless some are named. Folders that the daemon leaves out as a whole (another file system,
+/// another share) are listed with the files.
 int RunUnread(const Arguments& arguments) {
   uint64_t count = 0;
   uint64_t folders = 0;

@@ -13,10 +13,14 @@
 #include "platform/host/child_service.h"
 #include "platform/host/share_table.h"
 
+/// The state of the whole instance: the four daemons, the supervisor, and each share with indexed folders. Nothing here
+/// changes anything, and nothing that is broken hides the rest: each part is asked for by itself, and what is wrong
+/// with one takes the place of its state.
 namespace ferrox::cli {
 
 namespace {
 
+/// Of everything; a share that is paused says so in its own line.
 std::string PauseText(const Json::Value& status) {
   if (!status["paused"].asBool()) return "";
   const int64_t until = IntOf(status, "resume_time");
@@ -47,6 +51,7 @@ Json::Value RestingShares(const Json::Value& daemon, std::string& problem) try {
 
 constexpr char kStopped[] = "does not run; start it with 'fileindexctl up'";
 
+/// Without the engine nothing works, so that it is always said how to start it.
 std::string EngineText(const Json::Value& engine) {
   return engine.isNull() ? kStopped : "runs, process " + std::to_string(IntOf(engine, "pid"));
 }
@@ -56,6 +61,7 @@ void PrintDaemon(const char* name, const DaemonState& daemon, const std::string&
   (void)printf("%s: %s\n", name, daemon.problem.empty() ? text.c_str() : EscapeForTerminal(daemon.problem).c_str());
 }
 
+/// The daemon's own reply, unchanged, null when it does not run, or {"problem"}.
 Json::Value StatusJson(const DaemonState& daemon) {
   if (daemon.problem.empty()) return daemon.status;
   Json::Value json;
@@ -63,6 +69,7 @@ Json::Value StatusJson(const DaemonState& daemon) {
   return json;
 }
 
+/// `needed`: there are indexed folders. Without them the daemon is rightly away.
 std::string DaemonText(const Json::Value& daemon, bool needed) {
   if (daemon.isNull()) return needed ? kStopped : "does not run; it starts with the first indexed folder";
   return "runs, process " + std::to_string(IntOf(daemon, "pid")) + ", " + std::to_string(UintOf(daemon, "workers")) +
@@ -103,6 +110,7 @@ Json::Value SupervisorJson() {
   return json;
 }
 
+/// Says nothing on a host whose service manager does that work.
 void PrintSupervisor() {
   const Json::Value supervisor = SupervisorJson();
   if (TextOf(supervisor, "program") == "systemd") return;
@@ -124,6 +132,7 @@ struct Report {
   const Json::Value& NotificationDaemon() const { return state.notification_daemon.status; }
 };
 
+/// Asks the daemons first: a share that gets a worker after that is still shown, as one that rests.
 Report Gather() {
   Report report;
   report.state = AskAll();
@@ -147,6 +156,7 @@ int ExitCodeOf(const Report& report) {
   return kDone;
 }
 
+/// The members are what scripts go by; each is there always, null or empty where there is nothing, but for "problem".
 void PrintAsJson(const Report& report) {
   Json::Value json;
   json["engine"] = StatusJson(report.state.engine);
@@ -160,6 +170,7 @@ void PrintAsJson(const Report& report) {
   PrintJson(json);
 }
 
+/// A line for each, more where something is wrong with it.
 void PrintDaemons(const Report& report) {
   // Where the list of folders cannot be read, some may be indexed.
   const bool needed = report.has_folders || !report.folders_problem.empty();
@@ -172,6 +183,7 @@ void PrintDaemons(const Report& report) {
   PrintSupervisor();
 }
 
+/// First those that a worker has, then those that none has.
 void PrintShares(const Report& report) {
   if (!report.IndexDaemon().isNull()) {
     const bool hangs = !report.state.notification_daemon.problem.empty();
@@ -189,6 +201,7 @@ void PrintShares(const Report& report) {
 
 }  // namespace
 
+/// The exit code says whether all that is needed runs, for scripts that do not read the rest.
 int RunStatus(const Arguments& arguments) {
   const Report report = Gather();
   if (arguments.Has("--json")) {

@@ -1,9 +1,12 @@
 #include "cli/command_table.h"
 
+/// The commands as data. A row that is added here has help, usage line, checks of its options and completion at once;
+/// the manual (docs/man) must name it, too, which a test holds.
 namespace ferrox::cli {
 
 namespace {
 
+/// Options of several commands.
 const Option kJson = {"--json", nullptr, "one line of JSON for scripts"};
 const Option kAccounts = {"--accounts", "local|domain|ldap", "whose homes (default local)"};
 const Option kName = {"--name", "NAME", "what people call it (default: the last part of the path)"};
@@ -66,6 +69,7 @@ CommandGroup Searching() {
       }};
 }
 
+/// Of single folders.
 std::vector<Command> FolderCommands() {
   const Option kinds = {"--kinds", "KINDS", "document, audio, video, photo, joined with commas; or all, or none"};
   return {
@@ -183,6 +187,7 @@ std::vector<Command> ShareStateCommands() {
   };
 }
 
+/// Events of the host that the index follows: sent by its administrator or by the host's own scripts.
 CommandGroup HostEvents() {
   return {"Volumes, homes, users",
           {
@@ -245,6 +250,7 @@ CommandGroup Inspection() {
           }};
 }
 
+/// Both lists as one.
 std::vector<Command> Joined(std::vector<Command> first, const std::vector<Command>& second) {
   (void)first.insert(first.end(), second.begin(), second.end());
   return first;

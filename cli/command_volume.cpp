@@ -24,6 +24,7 @@ using fileindex::FolderMgr;
 
 constexpr char kRoot[] = "/";
 
+/// Whether an entry of the list still waits for this volume.
 bool WasPausedWith(const std::string& volume) {
   const FolderMgr configured;
   const auto& folders = configured.GetFolders();
@@ -60,6 +61,8 @@ void ForEach(const std::set<std::string>& shares, void (*change)(const std::stri
 
 }  // namespace
 
+/// Reports each folder that has changed. "/" is no prefix in the library's sense, so that its shares are paused one by
+/// one.
 int RunVolumePause(const Arguments& arguments) {
   const std::string volume = Volume(arguments.words[0], "pause");
   RequireDaemons();
@@ -68,6 +71,7 @@ int RunVolumePause(const Arguments& arguments) {
       "no indexed folder that is not paused lies on " + volume);
 }
 
+/// Folders that were paused otherwise, as single shares, go on as well: the library goes by where they lie.
 int RunVolumeResume(const Arguments& arguments) {
   const std::string volume = Volume(arguments.words[0], "resume");
   RequireDaemons();

@@ -15,6 +15,8 @@
 #include "fileindex/folders/folder_mgr.h"
 #include "sdk/share.h"
 
+/// Completion goes by the table of commands: names, options, and what the usage lines call the words ("SHARE", "PATH").
+/// It asks no daemon, so that pressing a key never waits.
 namespace ferrox::cli {
 
 namespace {
@@ -38,6 +40,8 @@ Words FoldersBelow(const std::string& typed) {
   return found;
 }
 
+/// For PATH: indexed folders, shares, and folders below what has been typed. A path that does not begin with "/" may be
+/// one on disk, which the shell knows better.
 Words SharePaths(const std::string& typed) {
   Words found = {":open"};
   if (typed.empty() || typed[0] != '/') found.push_back(":folders");
@@ -127,6 +131,8 @@ Words ArgumentWords(const Command& command, const Words& given) {
   return Candidates(names[place], typed);
 }
 
+/// What could stand at the place of the last word, without regard to what has been typed of it where that does not
+/// matter. The words before it decide: a global option, a command's name, its options and words.
 Words AllCompletions(Words& words) {
   if (words.size() > 1 && words[words.size() - 2] == "--root") return {":folders"};
   TakeRoot(words);

@@ -19,6 +19,7 @@ namespace ferrox::cli {
 
 namespace {
 
+/// The file's bytes, "" when there is none: enough to see whether it was changed.
 std::string FoldersFile() {
   std::string content;
   (void)ReadWholeFile(InstancePath(kFileIndexFoldersCfgPath), content);
@@ -42,6 +43,8 @@ void ChangeConfiguration(const std::function<void()>& change) {
   }
 }
 
+/// Goes by the list before and after, so that what is printed is what happened, also where an operation passes folders
+/// over.
 int ChangeAndReport(const std::function<void()>& change, const std::string& nothing) {
   const fileindex::FolderMgr before;
   ChangeConfiguration(change);
@@ -66,6 +69,7 @@ bool IsPaused(const std::string& share) {
                      [&](const auto& folder) { return folder->IsPaused() && folder->GetShare() == share; });
 }
 
+/// A detached queue is there as long as the daemon works on it.
 bool MarkIfBusy(const std::string& share) {
   if (!IsFileExist(fileindex::DetachedQueuePath(sdk::SDKShare(share).GetQueuePath()))) return false;
   fileindex::StatusMgr().SetShareStatus(share, fileindex::StatusMgr::kNeedReindex);

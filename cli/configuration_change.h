@@ -8,10 +8,12 @@ namespace ferrox::fileindex {
 class FolderMgr;
 }
 
+/// What the commands that change what is indexed have in common.
 namespace ferrox::cli {
 
-/// Runs a management operation. When it fails, also says whether the list of indexed folders has been changed, and then
-/// how to finish what follows from it. @throws Failure.
+/// Runs a management operation (fileindex/operations/index_mgr.h). When it fails, says what was not done, whether the
+/// list of indexed folders has been changed, and then how to finish what follows from it: the list is compared with
+/// what it was before, since an operation may fail before or after it saves. @throws Failure.
 void ChangeConfiguration(const std::function<void()>& change);
 
 /// Runs one and tells what has become of which folders, or `nothing`. @return the exit code. @throws Failure.

@@ -12,6 +12,7 @@ namespace {
 
 constexpr char kShownByte[] = "\\x%02X";
 
+/// "\u001b". Code points of more than 16 bits are not escaped; there are no control characters among them.
 std::string JsonEscape(int code_point) {
   char text[8];
   (void)snprintf(text, sizeof(text), "\\u%04x", static_cast<unsigned>(code_point) & 0xFFFF);
@@ -43,6 +44,8 @@ std::string EscapeOneLine(std::string_view text) {
   return EscapeForTerminal(line);
 }
 
+/// The JSON library writes invalid UTF-8 as it is and escapes only the controls below 0x20; what it leaves is escaped
+/// here, behind it, where only the bytes of strings can need it.
 std::string ToScriptJson(const Json::Value& value) {
   constexpr int kLoneSurrogate = 0xDC00;
   const std::string raw = toString(value);

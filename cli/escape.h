@@ -8,8 +8,8 @@
 /// File names are bytes. This is the one place that makes them safe to show: on a terminal, and in JSON for scripts.
 namespace ferrox::cli {
 
-/// For people: valid UTF-8 stays; every control character, those that turn the direction of the text among them, and
-/// every byte that is not part of valid UTF-8 becomes \xXX.
+/// For people, who may look at names that an attacker chose: valid UTF-8 stays; every control character, those that
+/// turn the direction of the text among them, and every byte that is not part of valid UTF-8 becomes \xXX.
 std::string EscapeForTerminal(std::string_view text);
 /// The same for a text of several lines: its tabulators stay, and its line breaks, each as a newline.
 std::string EscapeText(std::string_view text);

@@ -15,10 +15,13 @@
 #include "sdk/share.h"
 #include "services/support/settings_problem.h"
 
+/// Two tables, what went wrong by the subject of the failure and what helps by its code, and a few remedies that depend
+/// on the thing itself.
 namespace ferrox::cli {
 
 namespace {
 
+/// What helps against every failure of a code.
 struct Remedy {
   int code;
   const char* text;
@@ -105,6 +108,8 @@ std::string HolderOf(const std::string& lock_path) {
   return holder.empty() ? "" : holder + "; end it if it hangs, and try again";
 }
 
+/// What to do about it, "" where the sentence says it all. A remedy that knows the thing comes before the one of the
+/// code.
 std::string RemedyFor(const Error& error) {
   const Subject subject = SubjectError::Of(error);
   const std::string holder = subject.kind == Subject::kLock ? HolderOf(subject.name) : "";
@@ -122,6 +127,7 @@ std::string RemedyFor(const Error& error) {
   return {};
 }
 
+/// The library says only that a path cannot be indexed; here its rules are asked one by one, in its own order.
 std::string WhyNotIndexableAt(const std::string& full_path, const sdk::SDKShare& share) {
   struct stat status = {};
   if (lstat(full_path.c_str(), &status) != 0) {

@@ -41,6 +41,8 @@ std::string FullPathInShare(const std::string& share_path) {
   return sdk::SDKShare(name).GetPath() + share_path.substr(1 + name.size());
 }
 
+/// The share path of what lies on disk, where a share holds it under this path; else why not. A path through a link is
+/// refused and not followed: nothing is indexed under such a path, and the list would show another than was given.
 std::string OnDisk(const std::string& text) {
   const std::string path = AbsolutePath(text);
   const std::string share_path = SharePathOnDisk(path);
@@ -97,6 +99,7 @@ std::string AbsolutePath(const std::string& text) {
   return CleanPath(FromWorkingFolder(text, "a path that begins with /"), true);
 }
 
+/// Entries of the list come first, as they stand, so that a folder whose share is gone can still be deleted.
 std::string ToSharePath(const std::string& text, const fileindex::FolderMgr& configured) {
   if (text.empty()) throw UsageError("an empty path is no folder");
   if (configured.HasFolder(text)) return text;

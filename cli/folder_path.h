@@ -6,6 +6,7 @@ namespace ferrox::fileindex {
 class FolderMgr;
 }
 
+/// How the paths that people give become the share paths and full paths that the library takes.
 namespace ferrox::cli {
 
 /// Whether anything is at a path, a dangling link too.

@@ -15,6 +15,7 @@ std::string Formatted(const char* format, Values... values) {
   return text;
 }
 
+/// Null for a member that is missing, or where there is no object.
 const Json::Value& MemberOf(const Json::Value& object, const char* key) {
   return object.isObject() ? object[key] : Json::Value::nullSingleton();
 }
@@ -27,6 +28,7 @@ std::string Count(uint64_t number) {
   return text;
 }
 
+/// 999.5 is where "%.0f" would write "1000".
 std::string Size(int64_t bytes) {
   constexpr const char* kUnits[] = {"KB", "MB", "GB", "TB", "PB"};
   if (bytes < 1000) return std::to_string(bytes) + " B";
@@ -44,6 +46,7 @@ std::string Date(int64_t seconds) {
   return strftime(text, sizeof(text), "%Y-%m-%d %H:%M", &local) == 0 ? "-" : text;
 }
 
+/// Tenths of a second below 10 s, whole seconds below an hour, minutes above.
 std::string Duration(double seconds) {
   const auto whole = static_cast<long long>(seconds + 0.5);
   if (seconds < 10) return Formatted("%.1f s", seconds);

@@ -9,6 +9,7 @@ namespace ferrox::cli {
 
 namespace {
 
+/// Made absolute, since daemons that are started work from another folder.
 void UseRoot(const std::string& root) {
   if (root.empty()) throw UsageError("--root needs a folder");
   const std::string absolute = FromWorkingFolder(root, "--root a path that begins with /");

@@ -7,6 +7,7 @@
 
 namespace ferrox::cli {
 
+/// An empty name between two commas is refused like any other that is not known.
 Kinds::Kinds(const std::string& text) {
   chosen_.fill(text == "all");
   if (text == "all" || text == "none") return;

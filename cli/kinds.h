@@ -9,10 +9,11 @@
 
 namespace ferrox::cli {
 
-/// The kinds of files whose content can be indexed, in the order of the configuration.
+/// The kinds of files whose content can be indexed, in the order of the configuration. Users write and read these
+/// names.
 inline constexpr auto& kKinds = fileindex::kContentKindNames;
 
-/// A choice of kinds.
+/// A choice of kinds: of which files of a folder the content is indexed. Files of all kinds are found by name.
 class Kinds {
  public:
   /// From "document,photo", "all" or "none". @throws UsageError.
@@ -26,7 +27,7 @@ class Kinds {
   std::string Text() const;
 
  private:
-  std::array<bool, kKinds.size()> chosen_ = {};
+  std::array<bool, kKinds.size()> chosen_ = {};  ///< in the order of kKinds
 };
 
 }  // namespace ferrox::cli

@@ -25,6 +25,7 @@ std::string ShareOf(const std::string& index_id) {
   return StringStartWith(index_id, prefix) ? index_id.substr(prefix.size()) : index_id;
 }
 
+/// Whether the share is indexed at all, for the choice of the remedy.
 bool HasFolders(const std::string& share) try {
   return fileindex::FolderMgr().IsShareIndexed(share);
 } catch (const Error&) {
@@ -55,6 +56,7 @@ void LeftOut::Add(const std::string& share, int code, const std::string& reason,
   list_.append(std::move(entry));
 }
 
+/// The engine names indices and gives its own reasons; people know shares, and what they can do.
 void LeftOut::AddFrom(const Json::Value& reply) {
   if (!reply.isArray()) return;
   for (const Json::Value& entry : reply) {
@@ -76,6 +78,8 @@ size_t LeftOut::Unsearched() const {
       std::count_if(list_.begin(), list_.end(), [](const Json::Value& entry) { return entry["searched"] == false; }));
 }
 
+/// Errors below the engine's codes are no refusals: the engine cannot be reached, or the configuration cannot be read,
+/// which concerns all shares.
 bool LeftOut::Unless(const std::string& share, const std::function<void()>& run) {
   const auto leave_out = [&](int code, const std::string& reason) {
     Add(share, code, WhyUnusable(share, code, reason));

@@ -7,8 +7,9 @@
 
 namespace ferrox::cli {
 
-/// The shares that a command was to look at and could not, or not wholly, each with the reason and the remedy. Where
-/// there is one, nobody must take what was found for all that there is.
+/// The shares that a command was to search or list and could not, or not wholly, each with the reason and the remedy.
+/// Where there is one, what was found must not be taken for all that there is: the command says so on standard error
+/// and ends with kIncomplete.
 class LeftOut {
  public:
   /// Replaces what was said of the share before. `code`: the engine's, 0 for none. `searched`: what its index holds was
@@ -19,7 +20,8 @@ class LeftOut {
   /// Takes the entries of an engine's reply.
   void AddFrom(const Json::Value& reply);
 
-  /// Runs what concerns a share. Where an engine refuses, the share is left out. @return whether that was not so.
+  /// Runs what concerns a share. Where the engine refuses, the share is left out and the command goes on with the next.
+  /// @return whether `run` succeeded. @throws what `run` throws besides a refusal of the engine.
   bool Unless(const std::string& share, const std::function<void()>& run);
 
   /// How many were not searched at all.

@@ -21,6 +21,7 @@ namespace {
 
 using namespace ferrox::cli;  // NOLINT: the tool's own
 
+/// The whole help: all commands by their groups, a line each.
 std::string Overview() {
   std::string text =
       "Usage: fileindexctl [--root DIR] COMMAND ...\n"
@@ -65,6 +66,7 @@ void PrepareInstance(Needs needs) {
   ferrox::services::GuardLockFiles();
 }
 
+/// A word that begins names of two words is answered with what can follow it.
 [[noreturn]] void ThrowNoCommand(const std::string& word) {
   std::string known;
   for (const std::string& second : Completions({word, ""})) known += (known.empty() ? "" : ", ") + second;
@@ -72,6 +74,7 @@ void PrepareInstance(Needs needs) {
   throw UsageError("there is no command \"" + EscapeForTerminal(word) + "\"");
 }
 
+/// Finds the command, parses its arguments, prepares the instance and runs it. Help needs no instance.
 int Run(std::vector<std::string> words) {
   if (!words.empty() && words[0] == kCompleteCommand) return PrintCompletions({words.begin() + 1, words.end()});
   if (TakeGlobalOptions(words)) return kDone;
@@ -95,6 +98,8 @@ int Run(std::vector<std::string> words) {
 
 }  // namespace
 
+/// Each kind of failure has its exit code (ExitCode). Everything else that is thrown, such as a lack of memory, is a
+/// failure, too.
 int main(int argc, char** argv) {
   (void)setlocale(LC_CTYPE, "");
   try {

@@ -16,6 +16,7 @@ bool IsShare(const std::string& name) {
   return std::find(shares.begin(), shares.end(), name) != shares.end();
 }
 
+/// A table that cannot be used is said before anything else: every share would seem to be missing.
 kova::host::ShareEntry OwnShare(const std::string& name, const std::string& verb) {
   const ShareTable table = ShareTable::Load(kova::host::ShareTablePath());
   if (!table.Problem().empty()) throw Failure(table.Problem());

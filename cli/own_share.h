@@ -6,6 +6,10 @@
 
 namespace ferrox::cli {
 
+/// Shares come from two tables: that of the host, which the tool changes, and that of the file-sharing service, which
+/// only it changes.
+
+/// Whether either has a share of that name. @throws Error kShareEnumFailed.
 bool IsShare(const std::string& name);
 
 /// The entry of a share of the host's own table, which the tool changes. @throws Error kNoSuchShare; Failure when the

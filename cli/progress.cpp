@@ -16,6 +16,7 @@ namespace {
 constexpr std::chrono::seconds kLineInterval(2);
 constexpr size_t kBarWidth = 24;
 
+/// Asked each time, since windows change. 80 where the terminal does not say.
 size_t TerminalColumns() {
   winsize size = {};
   return ioctl(STDERR_FILENO, TIOCGWINSZ, &size) == 0 && size.ws_col > 0 ? size.ws_col : 80;
@@ -52,6 +53,7 @@ std::string Progress::Text(const Json::Value& share, size_t bar_width) {
   return text;
 }
 
+/// Cut to the width of the terminal: a line that wraps could not be replaced.
 void Progress::Show(const Json::Value& share) {
   if (on_terminal_) {
     const std::string text = EscapeForTerminal(Text(share, kBarWidth)).substr(0, TerminalColumns() - 1);

@@ -20,6 +20,7 @@ namespace ferrox::cli {
 
 namespace {
 
+/// Whether an errno value says that the caller lacks a right.
 bool IsDenial(int error) { return error == EACCES || error == EPERM; }
 
 /// Whether the caller is denied the access; no when there is nothing to access, or another reason against it.
@@ -58,6 +59,7 @@ std::string PlaceOf(std::string folder) {
 
 }  // namespace
 
+/// The remedy is the command line that works: as root, or as the owner of what was denied.
 NotPermitted MayNot(const std::string& act, const std::string& path) {
   const std::string owner = UserName(OwnerOf(path));
   const std::string& root = kova::InstanceRoot();
@@ -76,6 +78,7 @@ void RequireShareTable(Needs needs) {
   Warn(problem);
 }
 
+/// Asks for the files and folders themselves with the effective identity; what the daemons permit, they say themselves.
 void RequireRights(Needs needs) {
   if (needs >= Needs::kReading) {
     for (const std::string& file : {kova::host::ShareTablePath(), kova::InstanceRoot() + "/etc/kova/kova.json",

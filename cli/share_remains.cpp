@@ -19,6 +19,7 @@ std::string QueueOf(const std::string& share_path) {
   return path;
 }
 
+/// From the engine's list, which also has indices that are paused.
 bool HasIndex(const std::string& share) {
   const std::string id = fileindex::elastic::GetFileIndexID(share);
   for (const Json::Value& index : AskEngine("index_list", Json::Value(Json::objectValue))) {

@@ -2,6 +2,7 @@
 
 #include <string>
 
+/// What a share leaves when it goes: its queue, its index, its registration with the notification daemon.
 namespace ferrox::cli {
 
 /// The queue of the share whose absolute folder is, or was, `share_path`. @throws Error kInternal.

@@ -13,6 +13,7 @@ namespace ferrox::cli {
 
 namespace {
 
+/// A line for each reason with its count, and below it the paths of some files.
 void PrintReasons(const char* title, const Json::Value& counts, const Json::Value& examples) {
   for (const auto& reason : counts.getMemberNames()) {
     (void)printf("    %s: %s %s\n", title, Count(UintOf(counts, reason.c_str())).c_str(),
@@ -41,6 +42,7 @@ void PrintExtractErrors(const Json::Value& counts, const Json::Value& examples) 
   PrintReasons("partly read", partly, partly_examples);
 }
 
+/// What the worker does now, and what it has done since the daemon started.
 void PrintWork(const Json::Value& share) {
   (void)printf("    %s", EscapeForTerminal(Progress::Text(share, 0)).c_str());
   if (share.isMember("folders")) (void)printf("; %s", FoldersText(UintOf(share, "folders")).c_str());
@@ -72,6 +74,7 @@ void PrintIndex(const Json::Value& share) {
   }
 }
 
+/// How many changes wait, and how long the oldest has waited.
 void PrintQueued(const Json::Value& share) {
   const int64_t oldest = IntOf(share, "oldest_change");
   const int64_t age = oldest == 0 ? 0 : Clock::Get().Now() - oldest;

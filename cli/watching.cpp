@@ -7,10 +7,13 @@
 #include "common/clock.h"
 #include "fileindex/operations/watch_list.h"
 
+/// The notification daemon knows queues, not shares: its status is joined with that of the index daemon by the path of
+/// the queue.
 namespace ferrox::cli {
 
 namespace {
 
+/// The notification daemon's entry of the queue that this service registered, null when it has none.
 Json::Value WatchOf(const Json::Value& notification_daemon, const std::string& queue) {
   if (queue.empty() || !notification_daemon.isObject()) return Json::Value();
   for (const Json::Value& entry : notification_daemon["queues"]) {
@@ -28,6 +31,7 @@ std::string HowNoticed(const Json::Value& folder) {
          (covered || watch.empty() ? "" : ", not yet everywhere");
 }
 
+/// Changes that cannot be written to the queue stay in the daemon's memory until they can.
 std::string HeldLine(const Json::Value& watch) {
   if (UintOf(watch, "held") == 0) return "";
   const auto age = static_cast<double>(Clock::Get().Now() - IntOf(watch, "held_since"));
@@ -48,6 +52,7 @@ void AddWatches(const Json::Value& notification_daemon, Json::Value& index_daemo
   }
 }
 
+/// One line where all folders of the share are watched alike, else one for each folder.
 std::string WatchLines(const Json::Value& share, const std::string& daemon_problem) {
   constexpr char kNotNoticed[] = "    changes are not noticed, 'fileindexctl index' looks for them";
   const Json::Value& watch = share["watch"];
