@@ -2,6 +2,8 @@
 
 #include <algorithm>
 
+#include "services/fileindexd/file_presence.h"
+
 namespace ferrox::indexd {
 
 namespace {
@@ -67,7 +69,7 @@ void ChangeFollower::WriteChangedFiles() {
   struct stat status = {};
   bool any = false;
   for (const std::string& path : tail_.NextChangedFiles()) {
-    if (LookAt(path, status) != Presence::kThere || !rules_.CanBeIndexed(path)) continue;
+    if (PresenceOf(path, status) != Presence::kThere || !rules_.CanBeIndexed(path)) continue;
     early_writes_.insert(path);
     tasks_.Submit([this, path] { context_.writer.Write(path); });
     any = true;

@@ -6,6 +6,7 @@
 
 #include "base/path.h"
 #include "common/error.h"
+#include "services/fileindexd/file_presence.h"
 
 namespace ferrox::indexd {
 
@@ -17,11 +18,11 @@ namespace {
 /// A folder with fewer documents is moved in one request, which tells of each of them: both sides hold it in memory.
 constexpr unsigned kMovedAtOnce = 20000;
 /// Documents of which one may tell where a folder was: others may have been deleted or replaced since.
-constexpr unsigned kLookedAt = 1000;
+constexpr unsigned kSampledDocuments = 1000;
 
 bool IsFolder(const std::string& path) {
   struct stat status = {};
-  return LookAt(path, status) == Presence::kThere && S_ISDIR(status.st_mode);
+  return PresenceOf(path, status) == Presence::kThere && S_ISDIR(status.st_mode);
 }
 
 std::vector<std::string> EntriesOf(const std::string& folder) {
@@ -45,10 +46,10 @@ std::vector<DocumentMover::Step> DocumentMover::StepsOf(const std::string& path,
 /// Of a document of the folder's old place, what comes below the folder leads to the same file at the new one.
 std::string DocumentMover::RootBeforeMove(const std::string& top) {
   struct stat status = {};
-  for (const IndexedEntry& document : index_.List(top, "", kLookedAt)) {
+  for (const IndexedEntry& document : index_.List(top, "", kSampledDocuments)) {
     const std::string& path = document.path;
     for (size_t end = top.size(); end != std::string::npos; end = path.find('/', end + 1)) {
-      const bool is_there = LookAt(root_ + path.substr(end), status) == Presence::kThere;
+      const bool is_there = PresenceOf(root_ + path.substr(end), status) == Presence::kThere;
       if (is_there && SameFile(document.stamp, Stamp(status))) return path.substr(0, end);
     }
   }
@@ -90,8 +91,8 @@ bool DocumentMover::HoldsDocumentsOf(const std::string& old_path, const std::str
   struct stat status = {};
   const auto indexed = index_.Find(old_path);
   if (indexed.empty()) return false;
-  if (LookAt(path, status) == Presence::kThere) return SameFile(indexed.front().stamp, Stamp(status));
-  return LookAt(old_path, status) == Presence::kGone;
+  if (PresenceOf(path, status) == Presence::kThere) return SameFile(indexed.front().stamp, Stamp(status));
+  return PresenceOf(old_path, status) == Presence::kGone;
 }
 
 }  // namespace ferrox::indexd

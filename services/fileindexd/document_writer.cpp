@@ -1,11 +1,12 @@
 #include "services/fileindexd/document_writer.h"
 
-#include <cerrno>
+#include <utility>
 
 #include <kova/content_extract.h>
 #include <kova/content_type.h>
 
 #include "common/file_util.h"
+#include "services/fileindexd/file_presence.h"
 
 namespace ferrox::indexd {
 
@@ -14,6 +15,8 @@ using KOVA::CONTENT_EXTRACT::SameContent;
 using KOVA::CONTENT_EXTRACT::Stamp;
 
 namespace {
+
+constexpr unsigned kRemovedAtOnce = 1000;
 
 /// Whether the content may be readable that was not when the document was written. A file that broke its reader is not
 /// tried again by the same one.
@@ -30,11 +33,6 @@ bool NameTellsAnotherType(const IndexedEntry& indexed, const std::string& path) 
 
 }  // namespace
 
-Presence LookAt(const std::string& path, struct stat& status) {
-  if (lstat(path.c_str(), &status) == 0) return S_ISLNK(status.st_mode) ? Presence::kGone : Presence::kThere;
-  return errno == ENOENT || errno == ENOTDIR || errno == ELOOP ? Presence::kGone : Presence::kUnknown;
-}
-
 bool DocumentWriter::WantsContent(const std::string& path, const struct stat& status) const {
   return !S_ISDIR(status.st_mode) && folders_.WantsContent(path);
 }
@@ -46,7 +44,7 @@ bool DocumentWriter::IsCurrent(const IndexedEntry& indexed, const struct stat& s
 
 void DocumentWriter::Write(const std::string& path) {
   struct stat status = {};
-  if (LookAt(path, status) == Presence::kGone) return Remove(path);
+  if (PresenceOf(path, status) == Presence::kGone) return Remove(path);
   try {
     WillChange();
     const bool with_content = WantsContent(path, status);
@@ -60,7 +58,7 @@ void DocumentWriter::Write(const std::string& path) {
 
 void DocumentWriter::RefreshAttributes(const std::string& path) {
   struct stat status = {};
-  if (LookAt(path, status) == Presence::kGone) return Remove(path);
+  if (PresenceOf(path, status) == Presence::kGone) return Remove(path);
   const auto indexed = index_.Find(path);
   const bool same_content = !indexed.empty() && SameContent(indexed.front().stamp, Stamp(status)) &&
                             indexed.front().with_content == WantsContent(path, status);
@@ -75,25 +73,25 @@ void DocumentWriter::RefreshAttributes(const std::string& path) {
   }
   // Written to meanwhile, the document would have the stamp of the new content beside the text of the old.
   struct stat now = {};
-  const bool still = LookAt(path, now) == Presence::kThere && SameContent(Stamp(now), Stamp(status));
+  const bool still = PresenceOf(path, now) == Presence::kThere && SameContent(Stamp(now), Stamp(status));
   if (!still) Write(path);
 }
 
 void DocumentWriter::RefreshRenamed(const std::string& path, const std::string& old_path) {
   struct stat status = {};
-  if (LookAt(path, status) != Presence::kThere) return;
+  if (PresenceOf(path, status) != Presence::kThere) return;
   const bool same_kind = GetFileExtension(path, true) == GetFileExtension(old_path, true);
   same_kind ? RefreshAttributes(path) : Write(path);
 }
 
-/// Called while an error is handled: goes on when it is the file's, passes it on when it is the engine's, or that of
+/// Called in a catch block: records a failure that is the file's own, and throws one that is the engine's or that of
 /// content extraction as a whole.
 void DocumentWriter::RecordFailure(const Error& error, const std::string& path) {
   struct stat status = {};
   if (error.Code() == Error::kParseFailed) {
     const std::string problem = KOVA::CONTENT_EXTRACT::ExtractionProblem();
     if (!problem.empty()) throw Error(Error::kParseFailed, problem);
-    if (LookAt(path, status) == Presence::kGone) return Remove(path);
+    if (PresenceOf(path, status) == Presence::kGone) return Remove(path);
     return status_.AddFailure("cannot be examined", path);
   }
   if (error.Code() != Error::kEngineBadRequest) throw;
@@ -104,6 +102,21 @@ void DocumentWriter::Remove(const std::vector<std::string>& paths, bool and_belo
   WillChange();
   index_.Delete(paths, and_below);
   status_.DocumentsDeleted(paths.size());
+}
+
+void DocumentWriter::RemoveBelow(const std::string& folder, const Interruption& interruption) {
+  for (bool more = true; more;) {
+    interruption.Check();
+    std::vector<std::string> paths;
+    for (IndexedEntry& entry : index_.List(folder, "", kRemovedAtOnce)) paths.push_back(std::move(entry.path));
+    more = paths.size() == kRemovedAtOnce;
+    if (!paths.empty()) Remove(paths, false);
+  }
+}
+
+void DocumentWriter::RemoveTree(const std::string& path, const Interruption& interruption) {
+  Remove(path);
+  RemoveBelow(path, interruption);
 }
 
 void DocumentWriter::Commit() {

@@ -7,41 +7,45 @@
 #include <vector>
 
 #include "common/error.h"
+#include "services/fileindexd/interruption.h"
 #include "services/fileindexd/share_folders.h"
 #include "services/fileindexd/share_index.h"
 #include "services/fileindexd/share_status.h"
 
 namespace ferrox::indexd {
 
-enum class Presence { kThere, kGone, kUnknown };
-
-/// What is at `path` for the index: links count as nothing. Leaves errno set when that is unknown.
-Presence LookAt(const std::string& path, struct stat& status);
-
-/// Brings single documents in step with their files. A file that cannot be indexed is recorded and passed over; what
-/// the index itself refuses is thrown. Every call is safe from several threads.
+/// Brings single documents in line with their files: every write of the daemon goes through here to the index. A file
+/// that cannot be indexed is recorded in the status and passed over; @throws Error when the index cannot be written or
+/// content extraction as a whole does not work. Every call is safe from several threads.
 class DocumentWriter {
  public:
   /// All outlive it.
   DocumentWriter(ShareIndex& index, const ShareFolders& folders, ShareStatus& status)
       : index_(index), folders_(folders), status_(status) {}
 
-  /// Whether the document tells the truth about the file, and holds its content exactly when that is wanted.
+  /// Whether the document needs no writing: it has the stamp of the file's present state, and holds its content exactly
+  /// when that is wanted and as well as the present readers can read it.
   bool IsCurrent(const IndexedEntry& indexed, const struct stat& status) const;
 
   /// Writes the whole document of what is at the path, or removes it when there is nothing.
   void Write(const std::string& path);
-  /// The same, of the attributes alone when that cannot make an old content look like a new one.
+  /// The same, but leaves the content alone, so that the file is not read, when that cannot make an old content look
+  /// like a new one.
   void RefreshAttributes(const std::string& path);
   /// The same after a rename, which changes the moved entry itself and, with another extension, the way in which its
   /// content is read. Does nothing when it is gone already: a later operation knows its present place and still needs
   /// the document.
   void RefreshRenamed(const std::string& path, const std::string& old_path);
   void Remove(const std::string& path) { Remove(std::vector<std::string>{path}, false); }
-  /// The documents at the paths, and, with `and_below`, all below them.
+  /// The documents at the paths, and, with `and_below`, all below them, in one request.
   void Remove(const std::vector<std::string>& paths, bool and_below);
+  /// All documents below a folder, a thousand at a time: the index can remove all at once, but not be interrupted then.
+  /// @throws Interrupted.
+  void RemoveBelow(const std::string& folder, const Interruption& interruption);
+  /// The same with the document at the path.
+  void RemoveTree(const std::string& path, const Interruption& interruption);
 
-  /// Makes all that was done durable. @throws Error.
+  /// Makes all that was done durable, by whichever thread. @throws Error.
   void Commit();
   bool HasUncommitted() const { return uncommitted_; }
   /// To be called before the index is changed past this object.

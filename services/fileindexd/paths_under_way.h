@@ -12,7 +12,7 @@ namespace ferrox::indexd {
 class PathsUnderWay {
  public:
   /// Whether something at, above or below the path is worked on.
-  bool Touch(const std::string& path) const {
+  bool Overlaps(const std::string& path) const {
     const auto next = ordered_.lower_bound(path + "/");
     return (next != ordered_.end() && base::IsBelow(*next, path)) || paths_.HasAtOrAbove(path);
   }

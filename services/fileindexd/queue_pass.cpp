@@ -38,13 +38,11 @@ bool QueuePass::Run() {
   // Loaded only now: of folders that change later, the events are in a later queue.
   const ShareFolders folders = context_.folders.Load();
   const std::set<uint64_t> changed_files = ChangedNumbersIn(context_.queue.DetachedPath());
-  OperationRunner runner({context_.share, context_.root, folders, keeper_.Index(), context_.environment.pool,
-                          context_.interruption, context_.status, held_, context_.queue.Path(),
-                          context_.environment.early_write_interval, changed_files, keeper_.MayHoldStrays(),
-                          context_.applied.Get(), [&] { AwaitOtherFolders(folders); }, early_writes_});
+  OperationRunner runner({context_, folders, keeper_.Index(), held_, changed_files, keeper_.MayHoldStrays(),
+                          [&] { AwaitOtherFolders(folders); }, early_writes_});
   CarryOut(runner, folders, changed_files.size() > kChangedNumbersMax);
   // What went away in the meantime, with its volume for example, looked as if it had been deleted.
-  runner.CheckRoot();
+  held_.CheckStillThere();
   availability_.Check();
   MarkIfFoldersChanged(runner, folders);
   queue_.DeleteTmp();

@@ -1,3 +1,5 @@
+#define FERROX_SOURCE "operation_runner"
+
 #include "services/fileindexd/share_place.h"
 
 #include <dirent.h>
@@ -5,7 +7,9 @@
 
 #include <memory>
 
+#include "common/error.h"
 #include "common/file_util.h"
+#include "common/log.h"
 
 namespace ferrox::indexd {
 
@@ -53,6 +57,11 @@ bool HeldFolder::IsStillThere() const {
   struct stat there = {};
   return fd_.Valid() && fstat(fd_.Get(), &held) == 0 && stat(path_.c_str(), &there) == 0 &&
          held.st_dev == there.st_dev && held.st_ino == there.st_ino;
+}
+
+void HeldFolder::CheckStillThere() const {
+  FERROX_FAIL_IF(!IsStillThere(), Error::kPathNotIndexable,
+                 "the share's folder was unmounted or replaced while it was looked at; it is looked at again");
 }
 
 }  // namespace ferrox::indexd

@@ -34,6 +34,8 @@ class HeldFolder {
  public:
   explicit HeldFolder(const std::string& path);
   bool IsStillThere() const;
+  /// @throws Error kPathNotIndexable when it does not: what was not found there may be anywhere.
+  void CheckStillThere() const;
 
  private:
   const std::string& path_;

@@ -1,0 +1,123 @@
+#include "services/fileindexd/disk_stage.h"
+
+#include <fcntl.h>
+#include <sys/stat.h>
+
+#include "base/path.h"
+#include "base/unique_fd.h"
+#include "services/fileindexd/file_presence.h"
+#include "services/fileindexd/linked_documents.h"
+#include "services/fileindexd/removal_batch.h"
+
+namespace ferrox::indexd {
+
+using Place = PathRules::Place;
+
+struct DiskStage::Handler {
+  fileindex::FileIndexOP op;
+  void (DiskStage::*run)(const std::string& path, const std::string& old_path);
+};
+
+constexpr DiskStage::Handler DiskStage::kHandlers[] = {
+    {fileindex::OP_DELETE, &DiskStage::Delete},
+    {fileindex::OP_UPSERT, &DiskStage::Upsert},
+    {fileindex::OP_ATTR, &DiskStage::Attr},
+    {fileindex::OP_UPDATE_CFG, &DiskStage::UpdateCfg},
+    {fileindex::OP_RENAME, &DiskStage::Rename},
+    {fileindex::OP_REINDEX, &DiskStage::Reindex},
+    {fileindex::OP_FULL_REINDEX, &DiskStage::FullReindex},
+};
+
+DiskStage::DiskStage(const PassContext& context, PathRules& rules, DocumentWriter& writer, PassCommits& commits)
+    : context_(context),
+      rules_(rules),
+      writer_(writer),
+      commits_(commits),
+      tasks_(context.share.environment.pool, context.share.interruption),
+      comparer_(context, rules, writer, commits, tasks_) {}
+
+void DiskStage::CarryOut(fileindex::FileIndexOP op, const std::string& path, const std::string& old_path) {
+  for (const Handler& handler : kHandlers) {
+    if (handler.op == op) (this->*handler.run)(path, old_path);
+  }
+}
+
+/// What is there again is compared: of a file that a folder has replaced, the queue keeps the delete alone. A reindex
+/// that came behind it is gone from the queue, too.
+void DiskStage::Delete(const std::string& path, const std::string&) {
+  struct stat status = {};
+  if (PresenceOf(path, status) == Presence::kGone) return;
+  had_reindex_ = true;
+  comparer_.Compare(path);
+}
+
+void DiskStage::Upsert(const std::string& path, const std::string&) {
+  if (path == context_.share.root) return;
+  const bool wanted = rules_.CanBeIndexed(path);
+  tasks_.Submit([this, path, wanted] { wanted ? writer_.Write(path) : writer_.Remove(path); });
+}
+
+void DiskStage::Attr(const std::string& path, const std::string&) {
+  if (path == context_.share.root) return;
+  const Place place = rules_.PlaceOf(path);
+  if (place == Place::kOutside) {
+    tasks_.Submit([this, path] { writer_.Remove(path); });
+  } else if (BecameReadable(path)) {
+    comparer_.Compare(path);
+  } else if (place == Place::kIndexed) {
+    tasks_.Submit([this, path] { writer_.RefreshAttributes(path); });
+  }
+}
+
+/// The kinds that the operation names are of no use: documents tell which content they hold, so that only those differ
+/// whose kind was switched, also after a change whose event was lost.
+void DiskStage::UpdateCfg(const std::string& path, const std::string&) { comparer_.CompareOnce(path); }
+
+/// Both places are compared with the disk. Of a file, all that a comparison would do at its new place is done by tasks
+/// beside other files.
+void DiskStage::Rename(const std::string& path, const std::string& old_path) {
+  struct stat status = {};
+  const bool wanted = path != context_.share.root && rules_.CanBeIndexed(path);
+  const bool is_file = wanted && PresenceOf(path, status) == Presence::kThere && !S_ISDIR(status.st_mode);
+  if (wanted) tasks_.Submit([this, path, old_path] { writer_.RefreshRenamed(path, old_path); });
+  if (base::IsBelow(old_path, context_.share.root)) comparer_.CompareOnce(old_path);
+  if (is_file) {
+    tasks_.Submit([this, path] { writer_.RemoveBelow(path, context_.share.interruption); });
+  } else {
+    comparer_.CompareOnce(path);
+  }
+}
+
+void DiskStage::Reindex(const std::string& path, const std::string&) {
+  had_reindex_ = true;
+  comparer_.CompareOnce(path);
+}
+
+void DiskStage::FullReindex(const std::string&, const std::string&) {
+  had_reindex_ = true;
+  comparer_.Compare(context_.share.root);
+}
+
+/// Whether this is a folder that can be read and of which the index knows no content: its permissions may just have
+/// been opened.
+bool DiskStage::BecameReadable(const std::string& folder) const {
+  const base::UniqueFd opened(open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
+  return opened.Valid() && context_.index.List(folder, "", 1).empty();
+}
+
+void DiskStage::RecheckEarlyWrites(const std::set<std::string>& early_writes) {
+  RemovalBatch gone(tasks_, writer_, false);
+  struct stat status = {};
+  for (const std::string& path : early_writes) {
+    if (PresenceOf(path, status) == Presence::kGone) gone.Add(path);
+  }
+  gone.Flush();
+}
+
+void DiskStage::RefreshLinked() {
+  LinkedDocuments linked(context_, writer_, commits_, tasks_);
+  linked.RefreshChangedFiles();
+  linked.RefreshSuspects();
+}
+
+}  // namespace ferrox::indexd
