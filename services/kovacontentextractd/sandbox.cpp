@@ -23,9 +23,9 @@ namespace ferrox::extract {
 
 namespace {
 
-// Four layers, each of which alone would keep a taken-over reader from files and network: no privileges and an empty
-// root (GiveUpRights), resource limits, Landlock, seccomp (CloseSandbox). A kernel or a container may lack some of
-// them: what is missing is reported and logged, and the worker runs nevertheless.
+// Layers that cover for each other: no privileges and an empty root (GiveUpRights); resource limits, Landlock and
+// seccomp (CloseSandbox). A kernel or a container may lack some of them: what is missing is reported and logged, and
+// the worker runs nevertheless.
 
 constexpr uid_t kNobody = 65534;
 constexpr int kNiceness = 10;

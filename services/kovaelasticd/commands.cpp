@@ -11,6 +11,7 @@ namespace ferrox::engine {
 
 namespace {
 
+// What is refused as no id or path, rather than found out by the file system.
 constexpr size_t kIdMaxBytes = 512;
 constexpr size_t kPathMaxBytes = 8192;
 /// A longer list of documents is to be asked for in pages.
@@ -27,6 +28,7 @@ std::string IndexId(const Json::Value& data) {
   return id;
 }
 
+/// `path`, if it is one that a document or an index may have. `name` is the member that it stands in.
 std::string CheckedPath(const char* name, const std::string& path) {
   const bool usable =
       !path.empty() && path.front() == '/' && path.size() <= kPathMaxBytes && path.find('\0') == std::string::npos;
@@ -34,6 +36,7 @@ std::string CheckedPath(const char* name, const std::string& path) {
   return path;
 }
 
+/// An index's folder, without "/" at its end, so that one folder has one spelling.
 std::string FolderPath(const std::string& text) {
   std::string path = CheckedPath("path", text);
   while (path.size() > 1 && path.back() == '/') path.pop_back();
@@ -75,6 +78,7 @@ Json::Value OnIndexRebuilt(CommandCall& call) {
   return {};
 }
 
+/// "rebuilding" with time and reason, while the index is not complete.
 void AddRebuilding(const RebuildState& state, Json::Value& result) {
   if (state.Since() == 0) return;
   result["rebuilding"]["since"] = Json::Int64(state.Since());
@@ -93,6 +97,7 @@ Json::Value OnIndexConfigSet(CommandCall& call) {
   return {};
 }
 
+/// With "figures", opens each index that is not paused to count its documents.
 Json::Value OnIndexList(CommandCall& call) {
   Json::Value list(Json::arrayValue);
   const bool figures = OptionalBool(call.data, "figures", true);
@@ -142,6 +147,7 @@ Json::Value OnDocumentChange(CommandCall& call) {
   return {};
 }
 
+/// The documents that "query" asks for: {"qsl": {CONDITION}}, with exactly one condition.
 GetRequest ReadQuery(const Json::Value& query) {
   GetRequest request;
   const Json::Value& qsl = RequiredObject(query, "qsl");
@@ -162,6 +168,7 @@ GetRequest ReadQuery(const Json::Value& query) {
   return request;
 }
 
+/// Runs on the index's thread and so sees changes that are not committed yet, unlike a search.
 Json::Value OnGetByQuery(CommandCall& call) {
   const Registry::OpenIndex open = call.registry.Open(IndexId(call.data));
   const Json::Value& query = RequiredObject(call.data, "query");
@@ -259,6 +266,7 @@ DocumentChange ReadDocumentChange(const std::string& command, const Registry::Op
   index.schema->Check(document);
   const Json::Value& stored_path = document[field::kPath];
   if (command == kSet) {
+    // A new path moves the document; null is no path.
     if (stored_path.isString()) {
       (void)CheckedPath(field::kPath, stored_path.asString());
     } else if (document.isMember(field::kPath) && !stored_path.isNull()) {

@@ -21,6 +21,7 @@ constexpr size_t kValueBytes = 100;
 }  // namespace
 
 Json::Value ParseCommand(std::string_view text) {
+  // A text shorter than that cannot hold as many values.
   if (text.size() > kCommandValuesMax && CountJsonValues(text) > kCommandValuesMax) {
     throw Error(Error::kEngineBadRequest, "a command may hold at most " + std::to_string(kCommandValuesMax) +
                                               " values; send several, or a compound of them");

@@ -52,6 +52,7 @@ class CompoundParts {
   }
 
  private:
+  /// How much memory the trees of parts may take together, about.
   static constexpr size_t kTreesBytes = 32 << 20;
   static size_t TreeBytes(std::string_view text);
   static std::vector<std::string_view> TextsOf(std::string_view array);

@@ -5,7 +5,8 @@
 
 namespace ferrox::engine {
 
-/// A set of document numbers, one bit each.
+/// A set of document numbers, one bit each: 125 KB for a million documents. Numbers are 0 or more and, as new documents
+/// get the next one, dense; so joining two sets costs one pass over words of 64 bits.
 class DocSet {
  public:
   void Add(int64_t id) {

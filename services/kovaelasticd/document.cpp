@@ -18,7 +18,13 @@ namespace {
 /// Larger numbers are in no range.
 constexpr double kRangedMax = 1e15;
 
-/// A field whose value follows from a column: its name and how it follows.
+// A row's packed fields: for each one its number in the table "fields" and its value. Numbers are written 7 bits at a
+// time, the lowest first, with bit 7 set on all bytes but the last; signed ones with the sign in bit 0 (zigzag), so
+// that small negative numbers are short. A value is a byte of Tag and, for texts, arrays and objects (as JSON text) and
+// floating-point numbers, length and bytes.
+
+/// A field whose value follows from a column: its name and how it follows. Its place in the table is its bit in
+/// DocRow::derived, so new ones are added at the end.
 struct DerivedField {
   const char* name;
   Json::Value (*value)(const DocRow& row);
@@ -37,6 +43,7 @@ const DerivedField kDerived[] = {
     {field::kExtractError, [](const DocRow& row) { return Json::Value(row.error); }},
 };
 
+/// The place of a field in kDerived; -1 when it is not in there.
 int DerivedIndex(const std::string& name) {
   for (size_t i = 0; i < std::size(kDerived); ++i) {
     if (name == kDerived[i].name) return static_cast<int>(i);
@@ -44,7 +51,7 @@ int DerivedIndex(const std::string& name) {
   return -1;
 }
 
-/// How a packed value is written: a number in groups of 7 bits, texts behind their length.
+/// The first byte of a packed value. Stored: the numbers never change.
 enum class Tag : char { kNull, kFalse, kTrue, kInt, kText, kJson };
 
 void PutNumber(std::string& out, uint64_t value) {
@@ -123,6 +130,7 @@ class Unpacker {
   std::string_view bytes_;
 };
 
+/// A member that is a text, or else `otherwise`.
 std::string TextMember(const Json::Value& document, const char* name, const std::string& otherwise) {
   const Json::Value& member = document[name];
   return member.isString() ? member.asString() : otherwise;
@@ -157,6 +165,8 @@ void AppendTexts(std::string& out, const Json::Value& value) {
   }
 }
 
+/// Appends the words of a field, each with the field's name before it: "KOVAMDTitle<1F>holiday". One column of the
+/// full-text table thus holds the words of all fields.
 void AppendFieldWords(std::string& out, const std::string& name, const Json::Value& value) {
   std::string text;
   AppendTexts(text, value);
@@ -169,7 +179,7 @@ void AppendFieldWords(std::string& out, const std::string& name, const Json::Val
   }
 }
 
-/// Readers tell some numbers as texts.
+/// A number of 0 or more, rounded; nothing for what is none. Readers give some numbers as texts.
 std::optional<int64_t> WholeNumber(const Json::Value& value) {
   double number = -1;
   if (value.isNumeric()) {
@@ -184,6 +194,7 @@ std::optional<int64_t> WholeNumber(const Json::Value& value) {
   return static_cast<int64_t>(number + 0.5);
 }
 
+/// Appends the word that ranges find a field's number by.
 void AppendRangeWord(std::string& out, const std::string& name, const Json::Value& value) {
   const std::optional<int64_t> number = WholeNumber(value);
   if (number.has_value()) out += RangeWord(name, *number) + kReadyEnd;
@@ -193,7 +204,7 @@ void AppendRangeWord(std::string& out, const std::string& name, const Json::Valu
 
 std::string RangeWord(const std::string& field_name, int64_t number) {
   const auto limited = std::clamp<int64_t>(number, 0, static_cast<int64_t>(kRangedMax));
-  char digits[32];
+  char digits[32];  // 16 digits: the words' order, which is that of bytes, is then that of the numbers
   (void)snprintf(digits, sizeof(digits), "#%016" PRId64, limited);
   return field_name + kFieldEnd + digits;
 }
@@ -214,6 +225,8 @@ const std::string* FieldNames::NameOf(int64_t number) const {
   return &names_[static_cast<size_t>(number - 1)];
 }
 
+/// A field is left out of the packed ones only where its value is exactly the one that its column gives back: documents
+/// are returned as they were stored.
 DocRow PackDocument(const std::string& path, const Json::Value& document, const FieldNames& names) {
   DocRow row;
   row.path = path;

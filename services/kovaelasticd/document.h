@@ -13,10 +13,11 @@
 
 namespace ferrox::engine {
 
-/// What a file is, as "kind:" asks.
+/// What a file is, as "kind:" asks, by its extension. Stored in docs.kind: the numbers never change.
 enum Kind : int32_t { kDocument = 0, kAudio = 1, kVideo = 2, kImage = 3, kOther = 4, kFolder = 5 };
 
-/// Numbers for the names of document fields, so that stored documents are short.
+/// Numbers for the names of document fields, so that stored documents are short. Numbers count from 1, in the order in
+/// which an index met the names, and never change: rows refer to them. For one thread at a time.
 class FieldNames {
  public:
   void Add(int64_t number, const std::string& name);
@@ -45,11 +46,12 @@ struct DocRow {
   std::string packed;    ///< all other fields except the text content
 };
 
-/// The texts of a document that are searched, beside its content.
+/// The texts of a document that are searched, beside its content: the columns of meta_fts. They follow from the
+/// document and the schema alone, so that the words of a stored document can be computed again in order to remove them.
 struct MetaText {
   std::string grams;   ///< the name, for parts of it
   std::string name;    ///< the name, for its words
-  std::string title;   ///<
+  std::string title;   ///< "KOVAMDTitle"
   std::string text;    ///< the fields that plain words look into
   std::string fields;  ///< words marked with the field that they stand in
   bool operator==(const MetaText& other) const = default;
@@ -72,6 +74,7 @@ std::vector<std::string> NamesNeeded(const Json::Value& document, const FieldNam
 /// The fields of a stored document, without its text content; only those in `wanted` unless that is empty.
 Json::Value UnpackDocument(const DocRow& row, const FieldNames& names, const std::vector<std::string>& wanted);
 
+/// The searched texts of a document that is stored as `row`.
 MetaText MakeMetaText(const DocRow& row, const Json::Value& document, const Schema& schema);
 
 }  // namespace ferrox::engine

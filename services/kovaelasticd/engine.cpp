@@ -13,10 +13,11 @@ namespace ferrox::engine {
 
 namespace {
 
-/// What a request may have beside the members that are looked at.
+/// How many members a request may have at its top; "command", "data" and "compound" are read.
 constexpr size_t kMembersMax = 64;
-/// Of a compound; what is beyond it is told to be left out.
+/// Of a compound. Once it is that long, further results are replaced by an error.
 constexpr size_t kReplyMaxBytes = 256U << 20;
+/// Of an unknown command's name, what the error repeats.
 constexpr size_t kNameShownBytes = 100;
 
 int ReplyCode(const Error& error) {
@@ -24,6 +25,7 @@ int ReplyCode(const Error& error) {
   return error.Code() == Error::kBadArgument ? Error::kEngineBadRequest : error.Code();
 }
 
+/// The command that a part names. @throws Error for a part of another shape and for an unknown command.
 const Command& KnownCommand(const Json::Value& part) {
   const bool shaped = part.isObject() && part["command"].isString() && IsJsonObject(part["data"]);
   if (!shaped) throw Error(Error::kEngineBadRequest, kShapeText);
@@ -36,12 +38,14 @@ const Command& KnownCommand(const Json::Value& part) {
   return *command;
 }
 
+/// @throws Error kEngineNotPermitted. The peer's user is the one that the kernel gives for the socket.
 void RequireRights(const Command& command, const services::Peer& peer) {
   if (command.for_all || peer.uid == 0 || peer.uid == geteuid()) return;
   throw Error(Error::kEngineNotPermitted, "user " + std::to_string(peer.uid) + " may not use \"" + command.name +
                                               "\"; only root and the engine's own user may");
 }
 
+/// A part's "data", an empty object where it has none.
 Json::Value& DataOf(Json::Value& part) {
   Json::Value& data = part["data"];
   if (data.isNull()) data = Json::Value(Json::objectValue);
@@ -114,6 +118,7 @@ std::string Engine::Handle(const std::string& request, const services::Peer& pee
   return failure.isNull() ? text : toString(failure);
 }
 
+/// All parts of a compound are checked for shape and rights before the first is carried out.
 std::string Engine::Answer(const std::string& request, const services::Peer& peer) {
   const auto members = JsonMembers(request, kMembersMax);
   if (members.has_value() && members->size() == 1 && members->front().name == "\"compound\"") {
@@ -152,7 +157,9 @@ std::string Engine::AnswerCompound(CompoundParts& parts) {
   return reply.Text();
 }
 
-/// Carries out the next changes that are for the same index.
+/// Carries out the next changes that are for the same index, in one turn of its thread: a compound of ten thousand
+/// documents waits for the thread once. A change that is refused does not keep the others from being made; a failure of
+/// the store ends them all.
 void Engine::AnswerChanges(CompoundParts& compound, CompoundReply& reply) {
   const Json::Value id = compound.Front()["data"]["id"];
   std::vector<Json::Value> parts = compound.TakeWhile([&id](const Json::Value& part) {

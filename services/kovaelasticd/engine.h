@@ -13,7 +13,9 @@ namespace ferrox::engine {
 
 class CompoundReply;
 
-/// Answers the engine's requests (docs/formats/engine.md). Any number of threads may call Handle.
+/// Answers the engine's requests (docs/formats/engine.md): one command, or a compound of many, which are carried out in
+/// their order and answered one by one. Any number of threads may call Handle; a change waits for the thread of its
+/// index, a search for nobody.
 class Engine {
  public:
   /// Loads the indices that are noted in `state_folder`. @throws Error kInternal.

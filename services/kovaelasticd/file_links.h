@@ -9,9 +9,9 @@
 
 namespace ferrox::engine {
 
-/// Which documents are of one file under several names. Of a change that is seen under one name only, the documents of
-/// the others do not know: they are noted as suspects, until they are written again. What tells files apart is the
-/// number behind the last "." of "_KOVAStamp"; folders have no other names.
+/// Which documents are of one file under several names (hard links). A change of the file is seen under one name, and
+/// the documents of the others are then out of date: they are noted as suspects until they are written again. Files are
+/// told apart by the inode number behind the last "." of "_KOVAStamp"; folders have no other names.
 class FileLinks {
  public:
   /// The member of a document that tells what was seen of its file.
@@ -25,7 +25,9 @@ class FileLinks {
   void OnChange(int64_t id, const DocRow* before, const DocRow* after);
 
  private:
+  /// "" for a folder, a missing row and a row without stamp.
   std::string StampOf(const DocRow* row) const;
+  /// Notes the other documents of `file` as suspects, apart from those that have the same stamp.
   void MarkOthers(int64_t file, int64_t id, const std::string& stamp);
 
   Database& database_;

@@ -11,10 +11,17 @@ namespace ferrox::engine {
 
 namespace {
 
+// SQLite's FTS5 keeps the words; cutting text into words and counting hits is done here, by two extensions: the
+// tokenizer "kova" and the function kova_collect. A table is given three kinds of text, told apart by their first byte
+// (document.h): prose, which WordScanner cuts; a name, of which all groups of three characters are indexed; and ready
+// words. Queries are made of ready words, each quoted, so that none is taken for an operator.
+
+/// By this name sqlite3_value_pointer makes sure that the function is called by Collect and by no query of others.
 constexpr char kCollectorType[] = "HitCollector";
 /// A name has at most 255 bytes; a display text that takes its place is cut.
 constexpr size_t kNameGramsMax = 512;
 
+/// What FTS5 gives a tokenizer to hand its words to.
 using TokenSink = int (*)(void*, int, const char*, int, int, int);
 
 /// Hands words on to the full-text index.
@@ -69,6 +76,7 @@ int Tokenize(Fts5Tokenizer* /*tokenizer*/, void* context, int flags, const char*
   return output.Result();
 }
 
+/// The tokenizer has no state, but FTS5 wants an object.
 int CreateTokenizer(void* /*context*/, const char** /*arguments*/, int /*count*/, Fts5Tokenizer** tokenizer) {
   static char stateless;
   *tokenizer = reinterpret_cast<Fts5Tokenizer*>(&stateless);
@@ -77,6 +85,7 @@ int CreateTokenizer(void* /*context*/, const char** /*arguments*/, int /*count*/
 
 void DeleteTokenizer(Fts5Tokenizer* /*tokenizer*/) {}
 
+/// By MetaColumn.
 uint8_t PlaceOfColumn(int column) {
   constexpr uint8_t kPlaces[] = {kInNamePart, kInName, kInTitle, kInText, kInText};
   return column >= 0 && column <= kFieldsColumn ? kPlaces[column] : uint8_t{0};
@@ -102,6 +111,7 @@ int ReadRowHits(const Fts5ExtensionApi* api, Fts5Context* row, int phrase, uint8
   return SQLITE_OK;
 }
 
+/// A row that xQueryPhrase visits: it has the one phrase.
 int VisitRow(const Fts5ExtensionApi* api, Fts5Context* row, void* user) {
   const auto* visit = static_cast<const PhraseVisit*>(user);
   uint8_t count = 0;
@@ -146,6 +156,7 @@ void CollectFunction(const Fts5ExtensionApi* api, Fts5Context* row, sqlite3_cont
   if (result != SQLITE_OK) sqlite3_result_error_code(context, result);
 }
 
+/// FTS5 gives its functions to C code by this call.
 fts5_api* FullTextApi(Database& database) {
   fts5_api* api = nullptr;
   Statement statement = database.Prepare("SELECT fts5(?1)");

@@ -9,13 +9,13 @@
 
 namespace ferrox::engine {
 
-/// The columns of the two full-text tables.
+/// The columns of the full-text table meta_fts; content_fts has one, the body.
 enum MetaColumn : int { kGramsColumn, kNameColumn, kTitleColumn, kTextColumn, kFieldsColumn };
 
 /// Where a search word stands in a document, beside its content.
 enum HitPlace : uint8_t { kInNamePart = 1, kInName = 2, kInTitle = 4, kInText = 8 };
 
-/// One document that a word was found in.
+/// One document that a word was found in. Hundreds of thousands of them are kept for a frequent word.
 struct WordHit {
   uint32_t id;
   uint8_t count;   ///< how often it stands in the content, at most kCountMax
@@ -23,11 +23,12 @@ struct WordHit {
 };
 constexpr uint8_t kCountMax = 32;
 
-/// Collects the documents that a full-text expression finds: all of them in a set, and the newest-added `hits_max` of
-/// them one by one.
+/// Collects the documents that a full-text expression finds: all of them in a set, and the `hits_max` added to the
+/// index last one by one, with their counts.
 class HitCollector {
  public:
   explicit HitCollector(size_t hits_max) : hits_max_(hits_max) {}
+  /// Documents come in ascending order, phrase by phrase.
   void Add(int64_t id, uint8_t count, uint8_t places);
   const DocSet& Set() const { return set_; }
   DocSet TakeSet() { return std::move(set_); }

@@ -21,6 +21,7 @@ constexpr char kSetAside[] = ".damaged-";
 
 std::string ParentOf(const std::string& path) { return Dirname(path).empty() ? "/" : Dirname(path); }
 
+/// What was set aside of the file at `path`.
 std::vector<std::string> SetAsideOf(const std::string& path) {
   std::vector<std::string> found;
   const std::unique_ptr<DIR, int (*)(DIR*)> folder(opendir(ParentOf(path).c_str()), &closedir);
@@ -42,12 +43,15 @@ std::string Day(int64_t now) {
 
 }  // namespace
 
+/// An empty file without a log is what is left of one that was being made.
 bool IsIndexFileLost(const std::string& folder) {
   struct stat status = {};
   if (lstat(IndexFile(folder).c_str(), &status) != 0) return errno == ENOENT;
   return S_ISREG(status.st_mode) && status.st_size == 0 && !IsFileExist(IndexFile(folder) + "-wal");
 }
 
+/// By device numbers: a folder is a mount point when its parent is on another device. What does not exist yet counts as
+/// its nearest parent.
 std::string MountPointOf(const std::string& path) {
   std::string at = path;
   struct stat here = {};

@@ -5,6 +5,9 @@
 
 namespace ferrox::engine {
 
+// An index's folder holds "index.sqlite", SQLite's "-wal" and "-shm" beside it while it is open, the marker
+// "uncommitted" while there are changes that are not committed, and "index.sqlite.damaged-DATE", set aside.
+
 /// The files of the index in `folder`.
 std::string IndexFile(const std::string& folder);
 std::string MarkerFile(const std::string& folder);

@@ -27,8 +27,10 @@ struct GetRequest {
   uint64_t file = 0;    ///< the number at the end of "_KOVAStamp"; 0: not asked for
 };
 
+/// What hits are ordered by.
 enum class SortKey { kRelevance, kDate, kName, kSize };
 
+/// A search in one index.
 struct SearchRequest {
   const QueryNode* query = nullptr;  ///< lives as long as the search
   int64_t offset = 0;
@@ -41,6 +43,7 @@ struct SearchRequest {
   std::string mark_end = "]";
 };
 
+/// A document that was found, as it is shown.
 struct SearchHit {
   std::string path;
   double score = 0;
@@ -51,18 +54,19 @@ struct SearchHit {
 };
 
 struct SearchReply {
-  int64_t total = 0;
-  bool ranking_bounded = false;
+  int64_t total = 0;                     ///< all documents found, whether shown or not
+  bool ranking_bounded = false;          ///< there were more than ranked_max to order; some were left out of that
   std::vector<SearchHit> hits;           ///< from the first, so many as offset and limit ask for together
   std::vector<std::string> suggestions;  ///< other spellings, when nothing was found
 };
 
+/// Figures of an index; those of documents are as of its last commit.
 struct StoreStat {
   int64_t documents = 0;
-  int64_t with_content = 0;
-  int64_t bytes_on_disk = 0;
-  int64_t text_bytes = 0;
-  std::map<std::string, int64_t> extract_errors;
+  int64_t with_content = 0;                       ///< of these, those with text
+  int64_t bytes_on_disk = 0;                      ///< of all its files
+  int64_t text_bytes = 0;                         ///< of all texts, unpacked
+  std::map<std::string, int64_t> extract_errors;  ///< documents for each reason why content could not be read
   std::map<std::string, std::vector<std::string>> extract_error_examples;  ///< of each reason, one or two paths
 };
 

@@ -28,7 +28,7 @@ void KeepMemoryForSearches() {
 void Serve() {
   using namespace ferrox;
   constexpr uint32_t kRequestMaxBytes = 256U << 20;
-  constexpr unsigned kWorkers = 16;
+  constexpr unsigned kWorkers = 16;  // requests at a time: most wait for an index's thread or the disk
   services::Daemon daemon("kovaelasticd");
   const std::string state_folder = InstancePath("/var/lib/kova/kovaelasticd");
   if (!services::MakeFolders(state_folder, 0700)) {

@@ -17,6 +17,7 @@ namespace {
 constexpr int64_t kMin = std::numeric_limits<int64_t>::min();
 constexpr int64_t kMax = std::numeric_limits<int64_t>::max();
 constexpr int64_t kDaySec = 86400;
+/// For the texts of an account's record; a group with many members needs much.
 constexpr size_t kAccountBufferBytes = 64 << 10;
 
 /// Reads the digits at the front and takes them off; nothing when there are none or too many.
@@ -32,6 +33,7 @@ std::optional<int64_t> TakeNumber(std::string_view& text, size_t digits_max) {
   return value;
 }
 
+/// "700", "10k", "2MB", "1GiB": powers of 1024 in any spelling.
 std::optional<ValueRange> ParseSize(std::string_view text) {
   const std::optional<int64_t> number = TakeNumber(text, 15);
   if (!number.has_value()) return std::nullopt;
@@ -127,6 +129,7 @@ std::string Lower(std::string_view text) {
   return lower;
 }
 
+/// A name of a kind of file.
 struct KindName {
   const char* name;
   Kind kind;
@@ -136,6 +139,7 @@ constexpr KindName kKindNames[] = {{"document", kDocument}, {"doc", kDocument}, 
                                    {"picture", kImage},     {"other", kOther},  {"folder", kFolder}, {"dir", kFolder},
                                    {"directory", kFolder}};
 
+/// A name that people give a field, and the fields that it looks into.
 struct FriendlyName {
   const char* name;
   std::vector<std::string> fields;
@@ -170,6 +174,7 @@ const FriendlyName kFriendlyNames[] = {
     {"text", {field::kTextContent}},
 };
 
+/// A whole number.
 std::optional<ValueRange> ParseNumber(std::string_view text) {
   const std::optional<int64_t> number = TakeNumber(text, 15);
   return number.has_value() && text.empty() ? std::optional(ValueRange{*number, *number}) : std::nullopt;

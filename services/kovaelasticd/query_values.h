@@ -8,6 +8,9 @@
 
 namespace ferrox::engine {
 
+// The values of conditions: sizes, dates, durations, kinds, and the names that people give fields. All of them read
+// what stands behind "name:" and answer with nothing where they cannot; ConditionReader makes a sentence of that.
+
 /// A range of numbers, both ends included.
 struct ValueRange {
   int64_t low;
@@ -17,7 +20,8 @@ struct ValueRange {
 /// ">10M", "<=2k", "1k..2M", "..5G", "700": bytes. Nothing when the text is no size.
 std::optional<ValueRange> ParseSizeRange(std::string_view text);
 
-/// "2024", "2024-01..2024-06", ">2024-01-01", "7d", "today": seconds since the epoch, by local time.
+/// "2024", "2024-01..2024-06", ">2024-01-01", "7d", "today": seconds since the epoch, by local time. `now` is in the
+/// same measure. Nothing when the text is no date.
 std::optional<ValueRange> ParseDateRange(std::string_view text, int64_t now);
 
 /// Fields that hold a number, and how a range of them is written.
@@ -39,7 +43,7 @@ std::vector<std::string> FriendlyFields(std::string_view name);
 /// All names that can stand before a ":", for people.
 std::string KnownFields();
 
-/// The number of a user or group of this host; nothing when there is none of that name.
+/// The number of a user or group of this host; nothing when there is none of that name. May ask a directory service.
 std::optional<int64_t> UserNumberOf(const std::string& name);
 std::optional<int64_t> GroupNumberOf(const std::string& name);
 

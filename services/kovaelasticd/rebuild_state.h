@@ -8,11 +8,12 @@
 
 namespace ferrox::engine {
 
-/// That an index was made anew, since its file was damaged or lost, and is not yet full again; and how often that was
-/// so lately. A disk that damages one file after the other must not be read for ever.
+/// That an index was made anew, since its file was damaged or lost, and is not yet full again; and when that was so
+/// lately. A failing disk damages one file after the other: reading all shares again each time would go on for ever, so
+/// only kInADay rebuildings within 24 hours begin by themselves.
 class RebuildState {
  public:
-  /// So many in a day are made without being asked for.
+  /// How many within 24 hours may begin without a request for them.
   static constexpr size_t kInADay = 2;
 
   /// What Begin gave; 0 for an index that is complete.

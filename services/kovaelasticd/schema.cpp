@@ -13,6 +13,7 @@ namespace {
 /// Found by their own means, or of no use to anybody who searches.
 constexpr const char* kNotPlain[] = {field::kFsName,      field::kSearchName,  field::kDisplayName,    field::kKind,
                                      field::kTextContent, "KOVAMDContentType", "KOVAMDContentTypeTree"};
+// Facts about a file with conditions of their own (path:, size:, date:), or numbers that nobody types.
 constexpr const char* kNotSearchable[] = {field::kPath,
                                           field::kParent,
                                           field::kFsName,
@@ -35,6 +36,7 @@ constexpr const char* kNotSearchable[] = {field::kPath,
                                           "KOVAMDPhysicalSize",
                                           "KOVAMDPrivilege"};
 
+// Each of these adds a word to every document that has it (RangeWord).
 constexpr const char* kRanged[] = {"KOVAMDDurationSecond", "KOVAMDRecordingYear",   "KOVAMDContentCreationDate",
                                    "KOVAMDNumberOfPages",  "KOVAMDPixelWidth",      "KOVAMDPixelHeight",
                                    "KOVAMDISOSpeed",       "KOVAMDAudioTrackNumber"};

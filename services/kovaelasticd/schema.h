@@ -26,7 +26,11 @@ inline constexpr char kExtractError[] = "_KOVAExtractError";
 }  // namespace field
 
 /// How the fields of an index's documents are checked and searched, from the mappings that the index was created with.
-/// Does not change.
+/// Does not change, so any thread may use it.
+///
+/// Mappings are {"properties": {FIELD: {"type": ..., "_all": ...}}, "default": {...}}. A type of "text", "int",
+/// "double" or "bool" is checked, "string" takes anything; "_all" false takes a field out of plain words. Which fields
+/// "field:value" and ranges know does not depend on the mappings, so all indices answer one query alike.
 class Schema {
  public:
   /// `mappings` as index_create carries them; null stands for none: nothing is checked then.

@@ -15,11 +15,13 @@ namespace ferrox::engine {
 
 namespace {
 
+/// Hits in one reply.
 constexpr int64_t kLimitMax = 1000;
-/// Who wants to see more hits narrows the query.
+/// The last hit that can be reached by paging: all before it have to be ordered for it.
 constexpr int64_t kLastHitMax = 100000;
 constexpr size_t kMarkMaxBytes = 64;
 
+/// A hit and the index that it is from.
 struct IndexHit {
   std::string index_id;
   SearchHit hit;
@@ -48,6 +50,8 @@ std::string ReadMark(const Json::Value& data, const char* name, const char* othe
   return mark;
 }
 
+/// The request's members but the query and the indices. The default order is the best, newest or largest first, and
+/// names from A to Z.
 SearchRequest ReadSearch(const Json::Value& data) {
   SearchRequest request;
   request.offset = OptionalInt(data, "offset", 0, 0, kLastHitMax);
@@ -86,6 +90,7 @@ void LeaveOut(AskedIndices& asked, const std::string& id, const Error& error) {
   AddLeftOut(asked, id, error.Code(), error.what(), false);
 }
 
+/// Opens the indices that the request names. One that cannot be opened is left out, and said so in the reply.
 AskedIndices ReadIndices(CommandCall& call) {
   AskedIndices asked;
   std::vector<std::string> ids;
@@ -119,6 +124,7 @@ bool ComesFirst(const SearchRequest& request, const IndexHit& a, const IndexHit&
   return first.number_key < second.number_key;
 }
 
+/// A hit as the reply has it; takes the fields out of `found`.
 Json::Value HitJson(IndexHit& found) {
   Json::Value hit;
   hit["id"] = found.index_id;

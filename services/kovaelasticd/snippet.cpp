@@ -8,21 +8,27 @@ namespace ferrox::engine {
 
 namespace {
 
+// A snippet is the window of the text with the most different words of the query in it, then the most words. The text
+// is cut into words as the index was, so what matched there is found here; reading stops once a window has all words.
+
+// How much of a text is read, and how much behind the first word found.
 constexpr size_t kReadMaxBytes = 256 << 10;
 constexpr size_t kReadBehindBytes = 64 << 10;
 constexpr size_t kMatchesMax = 256;
-constexpr size_t kWindowBytes = 180;
-constexpr size_t kLeadBytes = 60;
-constexpr size_t kSnippetBytes = 240;
+constexpr size_t kWindowBytes = 180;   ///< from the first to the last word that count together
+constexpr size_t kLeadBytes = 60;      ///< shown before the first word
+constexpr size_t kSnippetBytes = 240;  ///< in all, without the marks
 constexpr char kEllipsis[] = "\xE2\x80\xA6";
 constexpr char kReplacement[] = "\xEF\xBF\xBD";
 
+/// A word of the query in the text, by bytes.
 struct Match {
   size_t begin;
   size_t end;
   size_t word;
 };
 
+/// The place of a folded word among those wanted; their number when it is none of them.
 size_t FindWord(const std::vector<SnippetWord>& words, std::string_view found) {
   for (size_t i = 0; i < words.size(); ++i) {
     const std::string& word = words[i].word;
@@ -84,7 +90,8 @@ size_t WordStart(std::string_view text, size_t pos, size_t limit) {
   return pos;
 }
 
-/// Appends text safe to print, with every run of blanks as one.
+/// Appends text safe to print, with every run of blanks and control characters as one blank. Marks that turn the
+/// direction of writing count as control characters: they would turn what is printed behind the snippet.
 void AppendClean(std::string& out, std::string_view text) {
   for (size_t pos = 0; pos < text.size();) {
     const CodePoint c = DecodeAt(text, pos);

@@ -6,8 +6,10 @@ namespace ferrox::engine {
 
 namespace {
 
+/// By the primary code, which is the low byte of an extended one.
 bool IsDamage(int result) { return (result & 0xFF) == SQLITE_CORRUPT || (result & 0xFF) == SQLITE_NOTADB; }
 
+/// What a person can do about it, the end of the error's sentence.
 std::string Remedy(int result) {
   switch (result & 0xFF) {
     case SQLITE_FULL:
@@ -75,6 +77,7 @@ void Statement::Run() {
 
 void Statement::Reset() { database_->Check(sqlite3_reset(statement_)); }
 
+/// As a blob: SQLite then neither checks nor converts it.
 std::string_view Statement::Text(int column) const {
   const void* data = sqlite3_column_blob(statement_, column);
   const int size = sqlite3_column_bytes(statement_, column);

@@ -20,6 +20,8 @@ class IndexDamaged : public Error {
 
 class Database;
 
+/// A thin layer over SQLite's C interface: owners for its handles, exceptions for its codes.
+///
 /// A prepared statement, borrowed from its database's cache while this lives. Parameters count from 1, columns from 0.
 /// Texts are bound without a copy: they must outlive the stepping.
 class Statement {
@@ -59,7 +61,10 @@ class Statement {
 /// One connection to one database file. For one thread at a time.
 class Database {
  public:
+  /// kCreate makes a missing file. kRead is opened for writing too, which the write-ahead log needs; its user forbids
+  /// changes by PRAGMA query_only.
   enum class Mode { kCreate, kWrite, kRead };
+  /// How long a statement waits for another connection's lock.
   static constexpr int kBusyTimeoutMs = 10000;
 
   /// @throws Error kEngineStorage with the file's name, the cause and the remedy, as every member does.
@@ -74,6 +79,7 @@ class Database {
   Statement Prepare(const std::string& sql);
   void Execute(const char* sql);
   void Execute(const std::string& sql) { Execute(sql.c_str()); }
+  /// The first column of the first row; 0 when there is none.
   int64_t QueryInt(const char* sql);
 
   sqlite3* Handle() { return handle_.get(); }

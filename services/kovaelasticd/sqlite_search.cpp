@@ -78,6 +78,7 @@ std::vector<RankedDocument> Searcher::OrderByWalk(const DocSet& documents) {
   return ranked;
 }
 
+/// The page by date, size or name; documents without date or size come as if theirs were below all others.
 std::vector<RankedDocument> Searcher::OrderByColumn(const DocSet& documents, int64_t total) {
   std::vector<RankedDocument> ranked = total <= kFetchForOrderMax ? OrderFetched(documents) : OrderByWalk(documents);
   ranked.resize(std::min(ranked.size(), Needed()), RankedDocument(0));
@@ -85,6 +86,7 @@ std::vector<RankedDocument> Searcher::OrderByColumn(const DocSet& documents, int
   return ranked;
 }
 
+/// A hit as it is shown. The text is unpacked only for a snippet, so a page unpacks as many texts as it has hits.
 SearchHit Searcher::LoadHit(const RankedDocument& ranked, const FoundWords& words) {
   SearchHit hit;
   hit.score = ranked.score;

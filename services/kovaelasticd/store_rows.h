@@ -10,6 +10,8 @@
 
 namespace ferrox::engine {
 
+// Rows of the tables "docs", "info" and "fields", for those who read and those who write.
+
 /// A document as the table "docs" has it.
 struct StoredDocument {
   int64_t id = 0;
@@ -31,9 +33,11 @@ StoredDocument ReadRow(const Statement& statement);
 /// Binds a row to parameters 2 to 11, in the order of the table's columns.
 void BindRow(Statement& statement, const DocRow& row, int64_t text_bytes);
 
+/// By path or by number; nothing when there is none. @throws Error kEngineStorage, as all that follow.
 std::optional<StoredDocument> FindDocument(Database& database, const std::string& path);
 std::optional<StoredDocument> FindDocument(Database& database, int64_t id);
 
+/// The table "info", as of the reader's snapshot or the writer's last SaveTotals.
 Totals LoadTotals(Database& database);
 void SaveTotals(Database& database, const Totals& totals);
 

@@ -4,12 +4,14 @@ namespace ferrox::engine {
 
 namespace {
 
+/// The library's default.
 constexpr int kLevel = 3;
 /// A damaged length must not ask for all memory.
 constexpr unsigned long long kTextMaxBytes = 256ULL << 20;
 /// What a codec keeps between two texts.
 constexpr size_t kKeepBytes = 4 << 20;
 
+/// Gives back what an unusually long text took.
 void Shrink(std::string& buffer) {
   if (buffer.capacity() > kKeepBytes) buffer = std::string();
 }

@@ -8,7 +8,8 @@
 
 namespace ferrox::engine {
 
-/// Packs and unpacks texts; keeps its working memory. For one thread at a time.
+/// Packs and unpacks texts, each on its own (zstd); keeps its working memory for the next one. For one thread at a
+/// time.
 class TextCodec {
  public:
   TextCodec();

@@ -84,6 +84,7 @@ bool WordScanner::NextPair(const CodePoint& c) {
   return complete;
 }
 
+/// A run of letters and digits, with accents on their own skipped. ASCII, which most text is, takes the inner loop.
 bool WordScanner::NextPlainWord() {
   const size_t begin = pos_;
   size_t end = pos_;

@@ -10,7 +10,7 @@
 
 namespace ferrox::engine {
 
-/// A longer word is indexed, and looked for, by its first so many bytes.
+/// A longer word is indexed, and looked for, by its first 64 bytes at most, never within a character.
 constexpr size_t kWordMaxBytes = 64;
 
 /// Cuts a text into index words, one after the other: runs of letters and digits, folded; text of scripts without
@@ -18,6 +18,8 @@ constexpr size_t kWordMaxBytes = 64;
 /// that "a_b" is a followed by b.
 class WordScanner {
  public:
+  /// kWord: of letters and digits. kPair: two neighbouring characters of a script without blanks. kRunEnd: the last
+  /// character of a run of these.
   enum class Kind : uint8_t { kWord, kPair, kRunEnd };
 
   /// `text` must outlive the scanner.
@@ -57,6 +59,7 @@ struct QueryWords {
   /// The last word is only the beginning of one.
   bool prefix = false;
 };
+/// Cuts the text of a condition as documents are cut. `prefix`: a "*" stood behind it.
 QueryWords SplitQueryText(std::string_view text, bool prefix);
 
 /// The overlapping groups of three characters of the folded text: what finds a part of a file name. At most `limit`.
