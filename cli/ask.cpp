@@ -9,7 +9,7 @@
 #include "common/error.h"
 #include "common/file_util.h"
 #include "common/paths.h"
-#include "fileindex/elastic/elastic_control.h"
+#include "wire/engine_requests.h"
 #include "wire/frame_client.h"
 
 namespace ferrox::cli {
@@ -67,16 +67,8 @@ wire::Reply SendCommand(const Daemon& daemon, const std::string& type, const Jso
   return wire::AskDaemon(daemon.socket, type, data, longest);
 }
 
-/// The engine takes {"command", "data"} and not {"type", "data"}; see docs/formats/engine.md.
-wire::Reply SendToEngine(const std::string& command, const Json::Value& data, std::chrono::seconds longest) {
-  Json::Value request;
-  request["command"] = command;
-  request["data"] = data;
-  return wire::AskEngine(request, longest);
-}
-
-Json::Value AskEngine(const std::string& command, const Json::Value& data, std::chrono::seconds longest) {
-  return DataOf(kEngine, SendToEngine(command, data, longest));
+Json::Value AskEngine(const Json::Value& request, std::chrono::seconds longest) {
+  return DataOf(kEngine, wire::AskEngine(request, longest));
 }
 
 /// A daemon that does not run has neither a status nor a problem: whether that matters depends on what is indexed.
@@ -89,9 +81,7 @@ DaemonState StateFrom(const Daemon& daemon, wire::Reply reply) try {
 }
 
 /// The engine has no command "status"; its answer to "ping" says the same.
-DaemonState EngineState() {
-  return StateFrom(kEngine, SendToEngine("ping", Json::Value(Json::objectValue), kStateWait));
-}
+DaemonState EngineState() { return StateFrom(kEngine, wire::AskEngine(wire::EngineRequest("ping"), kStateWait)); }
 
 DaemonState StateOf(const Daemon& daemon) {
   return StateFrom(daemon, SendCommand(daemon, "status", Json::Value(), kStateWait));
@@ -117,11 +107,9 @@ std::string WhyBehind(const std::vector<std::string>& shares, std::chrono::milli
 
 }  // namespace
 
-Json::Value AskEngine(const std::string& command, const Json::Value& data) {
-  return AskEngine(command, data, kLongestWait);
-}
+Json::Value AskEngine(const Json::Value& request) { return AskEngine(request, kLongestWait); }
 
-Json::Value Search(const Json::Value& data) { return AskEngine("search", data, kSearchWait); }
+Json::Value Search(const Json::Value& data) { return AskEngine(wire::EngineRequest("search", data), kSearchWait); }
 
 Json::Value AskIndexDaemon(const std::string& type, const Json::Value& data) {
   return DataOf(kIndexDaemon, SendCommand(kIndexDaemon, type, data));
@@ -183,7 +171,7 @@ std::map<std::string, std::string> AwaitChanges(const std::vector<std::string>& 
 }
 
 /// Waits less than for other commands: it is asked before anything is changed, so that giving up costs nothing.
-void RequireEngine() { (void)AskEngine("ping", Json::Value(Json::objectValue), kStateWait); }
+void RequireEngine() { (void)AskEngine(wire::EngineRequest("ping"), kStateWait); }
 
 void RequireIndexDaemon() { (void)AskIndexDaemon("status", Json::Value()); }
 
@@ -195,12 +183,6 @@ void RequireDaemons() {
 Json::Value ShareName(const std::string& name) {
   Json::Value data;
   data["share_name"] = name;
-  return data;
-}
-
-Json::Value IndexOf(const std::string& share) {
-  Json::Value data;
-  data["id"] = fileindex::elastic::GetFileIndexID(share);
   return data;
 }
 

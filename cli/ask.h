@@ -12,10 +12,11 @@
 /// commands wait for other work, a search 20 s, a status 5 s.
 namespace ferrox::cli {
 
-/// Sends one request to a daemon of this instance and returns the reply's "data".
+/// Sends one request to a daemon of this instance and returns the reply's "data"; the engine's requests are
+/// those of wire/engine_requests.h.
 /// @throws Failure when the daemon does not run or does not answer; Refusal with its own message and code when it
 /// refuses; NotPermitted when its socket, or the daemon, does not take requests of the calling user.
-Json::Value AskEngine(const std::string& command, const Json::Value& data);
+Json::Value AskEngine(const Json::Value& request);
 /// The engine's "search".
 Json::Value Search(const Json::Value& data);
 Json::Value AskIndexDaemon(const std::string& type, const Json::Value& data);
@@ -59,8 +60,6 @@ void NotifySettingChanged(const std::string& share);
 
 /// {"share_name": name}: the data of the index daemon's commands.
 Json::Value ShareName(const std::string& name);
-/// {"id": ...}: the data of the engine's commands that are about the index of one share.
-Json::Value IndexOf(const std::string& share);
 /// A share's entry in the index daemon's status; null when the daemon has none of it or `status` is null.
 Json::Value ShareIn(const Json::Value& status, const std::string& share);
 

@@ -22,6 +22,7 @@
 #include "fileindex/status_mgr.h"
 #include "fileindex/util.h"
 #include "sdk/share.h"
+#include "wire/engine_requests.h"
 
 /// Comparing a share with its index, making the index anew, and waiting for either. A comparison is an event in the
 /// share's queue, which the index daemon carries out when it comes to it; the tool asks the daemon for its status to
@@ -147,7 +148,7 @@ int RunRebuild(const Arguments& arguments) {
   const Share share = OpenShare(arguments.words[0]);
   if (ShareStatusOf(share.name).isNull()) ThrowNotWorkedOn(share.name);
   try {
-    (void)AskEngine("index_rebuild", IndexOf(share.name));
+    (void)AskEngine(wire::IndexRequest("index_rebuild", fileindex::elastic::GetFileIndexID(share.name)));
   } catch (const Refusal& refusal) {
     if (refusal.Code() != Error::kEngineNoSuchIndex) throw;
   }

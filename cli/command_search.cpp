@@ -24,6 +24,8 @@ namespace ferrox::cli {
 
 namespace {
 
+namespace field = fileindex::elastic;
+
 constexpr long long kLimitDefault = 10;
 constexpr long long kLimitMax = 1000;
 constexpr long long kFreshSeconds = 30;
@@ -87,7 +89,7 @@ Json::Value SearchRequest(const Arguments& arguments, const Scope& scope) {
 /// In one word. What is no folder goes by its extension, as it does for the choice of what is read.
 std::string KindOf(const Json::Value& fields, const std::string& path) {
   constexpr const char* kKinds[] = {"document", "audio", "video", "image", "other"};
-  if (BoolOf(fields, fileindex::elastic::kKOVAMDIsDir)) return "folder";
+  if (BoolOf(fields, field::kKOVAMDIsDir)) return "folder";
   return kKinds[fileindex::GetFileTypeByFullPath(path)];
 }
 
@@ -121,9 +123,8 @@ void PrintHit(const Json::Value& hit, bool on_terminal) {
   (void)printf("%s\n", on_terminal ? ("\033[36m" + shown + "\033[0m").c_str() : shown.c_str());
   const std::string snippet = TextOf(hit, "snippet");
   if (!snippet.empty()) (void)printf("    %s\n", ShowSnippet(snippet, on_terminal).c_str());
-  (void)printf("    %s, %s, %s\n", KindOf(fields, path).c_str(),
-               Size(IntOf(fields, fileindex::elastic::kKOVAMDFSSize)).c_str(),
-               Date(IntOf(fields, fileindex::elastic::kKOVAMDFSContentChangeDate)).c_str());
+  (void)printf("    %s, %s, %s\n", KindOf(fields, path).c_str(), Size(IntOf(fields, field::kKOVAMDFSSize)).c_str(),
+               Date(IntOf(fields, field::kKOVAMDFSContentChangeDate)).c_str());
 }
 
 /// How many were found, which of them are shown, and how long the engine took.

@@ -29,7 +29,7 @@
 #include "fileindex/status_mgr.h"
 #include "fileindex/util.h"
 #include "sdk/share.h"
-#include "wire/fields.h"
+#include "wire/engine_requests.h"
 
 /// A share gets another name or another folder. The table of shares goes first, since the library asks it where the
 /// share is; each step may be repeated, so that the same command finishes what an earlier run has begun.
@@ -160,10 +160,9 @@ void Follow(const Move& move, void (*move_index)(const Move& move), const std::s
 
 /// Whether the share's index still has documents of its old place.
 bool HasDocumentsBelow(const std::string& share, const std::string& old_path) {
-  Json::Value data = IndexOf(share);
-  data["query"]["qsl"]["prefix"][fileindex::elastic::kKOVAMDPath] = old_path + "/";
-  data["query"]["limit"] = 1;
-  return HasIndex(share) && !AskEngine("document_get_by_query", data).empty();
+  const Json::Value request = wire::FindDocumentsRequest(fileindex::elastic::GetFileIndexID(share),
+                                                         {.which = wire::AllBelow(old_path), .limit = 1});
+  return HasIndex(share) && !AskEngine(request).empty();
 }
 
 /// Whether anything still bears the share's old name or lies at its old place.

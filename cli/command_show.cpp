@@ -17,6 +17,7 @@
 #include "fileindex/folders/folder_mgr.h"
 #include "fileindex/util.h"
 #include "sdk/share.h"
+#include "wire/engine_requests.h"
 #include "wire/fields.h"
 
 /// What the index holds of single files, and which files it holds without their content. Fields of documents are named
@@ -25,35 +26,22 @@ namespace ferrox::cli {
 
 namespace {
 
-constexpr char kTextField[] = "KOVAMDTextContent";
-constexpr char kErrorField[] = "_KOVAExtractError";
-constexpr char kVersionField[] = "_KOVAExtractVersion";
-constexpr char kPathField[] = "KOVAMDPath";
-constexpr char kCutField[] = "_KOVATextCut";
+using namespace fileindex::elastic;  // the fields' names
+
 constexpr size_t kTextShownBytes = 300;
-constexpr int kPageEntries = 10000;
+constexpr unsigned kPageEntries = 10000;
 
-/// What the path says already, or what is told in words of its own.
-constexpr const char* kShownElsewhere[] = {kPathField,     "KOVAMDParent",         "KOVAMDFSName",
-                                           "KOVAMDKind",   "KOVAMDSearchFileName", "KOVAMDDisplayName",
-                                           "KOVAMDIsDir",  "KOVAMDExtension",      "KOVAMDContentType",
-                                           "KOVAMDFSSize", "KOVAMDLogicalSize",    "KOVAMDContentModificationDate",
-                                           kErrorField,    kVersionField,          "_KOVANeedMeta",
-                                           "_KOVAStamp",   "_KOVATextEncoding",    kCutField};
+/// What the path says already, or what is shown in words of its own.
+constexpr const char* kShownElsewhere[] = {kKOVAMDPath,        kKOVAMDParent,         kKOVAMDFSName,
+                                           kKOVAMDKind,        kKOVAMDSearchFileName, kKOVAMDDisplayName,
+                                           kKOVAMDIsDir,       kKOVAMDExtension,      kKOVAMDContentType,
+                                           kKOVAMDFSSize,      kKOVAMDLogicalSize,    kKOVAMDContentModificationDate,
+                                           k_KOVAExtractError, k_KOVAExtractVersion,  k_KOVANeedMeta,
+                                           k_KOVAStamp,        k_KOVATextEncoding,    k_KOVATextCut};
 
-/// Documents of the share's index that a query asks for (docs/formats/engine.md).
-Json::Value Entries(const std::string& share, Json::Value query) {
-  Json::Value data = IndexOf(share);
-  data["query"] = std::move(query);
-  return AskEngine("document_get_by_query", data);
-}
-
-/// The document at one path. Without `field` it comes with all of its members but the text, which may be large.
-Json::Value QueryOf(const std::string& path, const char* field = nullptr) {
-  Json::Value query;
-  query["qsl"]["term"][kPathField] = path;
-  if (field != nullptr) query["load_field"].append(field);
-  return query;
+/// Documents of the share's index that a query asks for.
+Json::Value Entries(const std::string& share, const wire::DocumentQuery& query) {
+  return AskEngine(wire::FindDocumentsRequest(GetFileIndexID(share), query));
 }
 
 /// "KOVAMDTitle" is "Title", "KOVAStateOrProvince" "StateOrProvince".
@@ -82,23 +70,23 @@ void PrintLine(const std::string& name, const std::string& value) {
 
 /// Whether the content was read, by what, and why not.
 std::string Reading(const Json::Value& document) {
-  if (BoolOf(document, fileindex::elastic::kKOVAMDIsDir)) return "a folder";
-  if (!document["_KOVANeedMeta"].isBool()) return "not wanted; 'fileindexctl folder set --kinds' chooses what is read";
-  const std::string error = TextOf(document, kErrorField);
-  const std::string reader = " (reader version " + std::to_string(IntOf(document, kVersionField)) + ")";
+  if (BoolOf(document, kKOVAMDIsDir)) return "a folder";
+  if (!document[k_KOVANeedMeta].isBool()) return "not wanted; 'fileindexctl folder set --kinds' chooses what is read";
+  const std::string error = TextOf(document, k_KOVAExtractError);
+  const std::string reader = " (reader version " + std::to_string(IntOf(document, k_KOVAExtractVersion)) + ")";
   if (StringStartWith(error, kPartlyRead)) return EscapeOneLine(error) + reader;
   if (!error.empty()) return "not read, or not all: " + EscapeOneLine(error) + reader;
-  if (document[kCutField].isBool()) return std::string(kPartlyRead) + "only the beginning of its text" + reader;
-  return IntOf(document, kVersionField) == 0 ? "no reader for this type" : "read" + reader;
+  if (document[k_KOVATextCut].isBool()) return std::string(kPartlyRead) + "only the beginning of its text" + reader;
+  return IntOf(document, k_KOVAExtractVersion) == 0 ? "no reader for this type" : "read" + reader;
 }
 
 /// The size of the text and its beginning, cut between two characters.
 void PrintText(const Json::Value& document, const std::string& text) {
   if (text.empty()) return;
-  const std::string encoding = TextOf(document, "_KOVATextEncoding");
+  const std::string encoding = TextOf(document, k_KOVATextEncoding);
   PrintLine("text", Size(static_cast<int64_t>(text.size())) +
                         (encoding.empty() ? "" : ", was " + EscapeOneLine(encoding)) +
-                        (document[kCutField].isBool() ? ", the beginning of more" : ""));
+                        (document[k_KOVATextCut].isBool() ? ", the beginning of more" : ""));
   size_t end = std::min(text.size(), kTextShownBytes);
   while (end < text.size() && (static_cast<unsigned char>(text[end]) & 0xC0) == 0x80) --end;
   (void)printf("        %s%s\n", EscapeOneLine(text.substr(0, end)).c_str(), end < text.size() ? " ..." : "");
@@ -106,10 +94,10 @@ void PrintText(const Json::Value& document, const std::string& text) {
 
 /// Everything that the index has of the file, the fields under short names.
 void PrintDocument(const Json::Value& document, const std::string& text) {
-  (void)printf("%s\n", EscapeForTerminal(TextOf(document, kPathField)).c_str());
+  (void)printf("%s\n", EscapeForTerminal(TextOf(document, kKOVAMDPath)).c_str());
   PrintLine("content", Reading(document));
-  if (document.isMember("KOVAMDContentType")) PrintLine("type", EscapeOneLine(TextOf(document, "KOVAMDContentType")));
-  PrintLine("size", Size(IntOf(document, "KOVAMDFSSize")));
+  if (document.isMember(kKOVAMDContentType)) PrintLine("type", EscapeOneLine(TextOf(document, kKOVAMDContentType)));
+  PrintLine("size", Size(IntOf(document, kKOVAMDFSSize)));
   for (const std::string& field : document.getMemberNames()) {
     const bool is_shown =
         std::find(std::begin(kShownElsewhere), std::end(kShownElsewhere), field) != std::end(kShownElsewhere);
@@ -124,19 +112,19 @@ bool Show(const std::string& file, const Arguments& arguments, LeftOut& left_out
   const std::string path = fileindex::GetFullPath(share_path);
   const std::string share = fileindex::GetShareNameByPath(share_path);
   Json::Value documents;
-  if (!left_out.Unless(share, [&] { documents = Entries(share, QueryOf(path)); })) return false;
+  if (!left_out.Unless(share, [&] { documents = Entries(share, {wire::OnlyAt(path)}); })) return false;
   if (documents.empty()) {
     if (left_out.AddIfRebuilding(share)) return false;
     (void)fprintf(stderr, "%s is not in the index; 'fileindexctl index %s' looks for what is not\n",
                   EscapeForTerminal(path).c_str(), EscapeForTerminal(share).c_str());
     return false;
   }
-  const Json::Value texts = Entries(share, QueryOf(path, kTextField));
-  const std::string text = texts.empty() ? "" : TextOf(texts[0], kTextField);
+  const Json::Value texts = Entries(share, {wire::OnlyAt(path), {kKOVAMDTextContent}});
+  const std::string text = texts.empty() ? "" : TextOf(texts[0], kKOVAMDTextContent);
   if (arguments.Has("--text")) {
     PrintBytes(isatty(STDOUT_FILENO) == 1 ? EscapeText(text) : text);  // a file gets it as it was read
   } else if (arguments.Has("--json")) {
-    if (!text.empty()) documents[0][kTextField] = text;
+    if (!text.empty()) documents[0][kKOVAMDTextContent] = text;
     PrintJson(documents[0]);
   } else {
     PrintDocument(documents[0], text);
@@ -147,15 +135,15 @@ bool Show(const std::string& file, const Arguments& arguments, LeftOut& left_out
 /// One file with the reason that the reader gave.
 void PrintUnread(const Json::Value& document, bool json) {
   if (!json) {
-    (void)printf("%s\n    %s\n", EscapeForTerminal(TextOf(document, kPathField)).c_str(),
-                 EscapeOneLine(TextOf(document, kErrorField)).c_str());
+    (void)printf("%s\n    %s\n", EscapeForTerminal(TextOf(document, kKOVAMDPath)).c_str(),
+                 EscapeOneLine(TextOf(document, k_KOVAExtractError)).c_str());
     return;
   }
   Json::Value line;
-  line["path"] = document[kPathField];
-  line["reason"] = document[kErrorField];
-  line["partly_read"] = StringStartWith(TextOf(document, kErrorField), kPartlyRead);
-  line["reader_version"] = Json::Int64(IntOf(document, kVersionField));
+  line["path"] = document[kKOVAMDPath];
+  line["reason"] = document[k_KOVAExtractError];
+  line["partly_read"] = StringStartWith(TextOf(document, k_KOVAExtractError), kPartlyRead);
+  line["reader_version"] = Json::Int64(IntOf(document, k_KOVAExtractVersion));
   PrintJson(line);
 }
 
@@ -163,16 +151,13 @@ void PrintUnread(const Json::Value& document, bool json) {
 /// share. @return how many there are.
 uint64_t ListUnread(const std::string& share, bool json) {
   uint64_t count = 0;
-  Json::Value query;
-  query["qsl"]["unread"] = true;
-  query["limit"] = kPageEntries;
-  for (const char* field : {kPathField, kErrorField, kVersionField}) query["load_field"].append(field);
+  wire::DocumentQuery query = {wire::Unread(), {kKOVAMDPath, k_KOVAExtractError, k_KOVAExtractVersion}, kPageEntries};
   while (true) {
     const Json::Value page = Entries(share, query);
     for (const Json::Value& document : page) PrintUnread(document, json);
     count += page.size();
-    if (page.size() < static_cast<Json::ArrayIndex>(kPageEntries)) return count;
-    query["after"] = page[page.size() - 1][kPathField];
+    if (page.size() < kPageEntries) return count;
+    query.after = page[page.size() - 1][kKOVAMDPath].asString();
   }
 }
 

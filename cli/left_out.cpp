@@ -12,6 +12,7 @@
 #include "common/file_util.h"
 #include "fileindex/elastic/elastic_control.h"
 #include "fileindex/folders/folder_mgr.h"
+#include "wire/engine_requests.h"
 
 namespace ferrox::cli {
 
@@ -67,7 +68,7 @@ void LeftOut::AddFrom(const Json::Value& reply) {
 }
 
 bool LeftOut::AddIfRebuilding(const std::string& share) {
-  const Json::Value rebuilding = AskEngine("index_stat", IndexOf(share))["rebuilding"];
+  const Json::Value rebuilding = AskEngine(wire::IndexRequest("index_stat", GetFileIndexID(share)))["rebuilding"];
   if (!rebuilding.isObject()) return false;
   Add(share, 0, "its index is being rebuilt, because " + TextOf(rebuilding, "reason"), true);
   return true;

@@ -8,6 +8,7 @@
 #include "fileindex/elastic/elastic_control.h"
 #include "fileindex/operations/watch_list.h"
 #include "fileindex/queue/queue_file.h"
+#include "wire/engine_requests.h"
 
 namespace ferrox::cli {
 
@@ -22,7 +23,7 @@ std::string QueueOf(const std::string& share_path) {
 /// From the engine's list, which also has indices that are paused.
 bool HasIndex(const std::string& share) {
   const std::string id = fileindex::elastic::GetFileIndexID(share);
-  for (const Json::Value& index : AskEngine("index_list", Json::Value(Json::objectValue))) {
+  for (const Json::Value& index : AskEngine(wire::ListIndicesRequest(true))) {
     if (index["id"].asString() == id) return true;
   }
   return false;

@@ -45,6 +45,15 @@ FERROX_FIELD_NAMES(FERROX_DEFINE_FIELD)
 inline constexpr const char* kFieldNames[] = {FERROX_FIELD_NAMES(FERROX_LIST_FIELD)};
 #undef FERROX_LIST_FIELD
 
+// Members of stored documents that are for programs and no fields of the schema: nobody searches them.
+inline constexpr char k_KOVAStamp[] = "_KOVAStamp";        ///< text: differs when size, times or inode do; ends in the
+                                                           ///< last "." and the inode's number
+inline constexpr char k_KOVANeedMeta[] = "_KOVANeedMeta";  ///< bool: the content was wanted when it was written
+inline constexpr char k_KOVAExtractVersion[] = "_KOVAExtractVersion";  ///< int: of the reader; 0: there is none
+inline constexpr char k_KOVAExtractError[] = "_KOVAExtractError";  ///< text: why content, or a part, could not be read
+inline constexpr char k_KOVATextCut[] = "_KOVATextCut";            ///< bool: there was more text than is kept
+inline constexpr char k_KOVATextEncoding[] = "_KOVATextEncoding";  ///< text: of the file's bytes, for people
+
 // The settings of content extraction.
 inline constexpr char kNeedMeta[] = "need_meta";  ///< in the configuration: whether the content is read, too
 inline constexpr char kCfg[] = "cfg";

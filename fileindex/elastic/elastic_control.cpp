@@ -6,13 +6,14 @@
 
 #include <kova/content_extract.h>
 
+#include "common/file_util.h"
 #include "common/json_util.h"
 #include "common/log.h"
 #include "common/new_class.h"
 #include "fileindex/elastic/comm.h"
-#include "fileindex/elastic/requests.h"
 #include "fileindex/status_mgr.h"
 #include "sdk/share.h"
+#include "wire/engine_requests.h"
 #include "wire/fields.h"
 
 namespace ferrox::fileindex::elastic {
@@ -47,11 +48,45 @@ Json::Value BuildDocument(const std::string& path, bool need_meta) {
 /// The documents that lie below `dir`, in the engine's order.
 Json::Value ListBelow(const std::string& index_id, const std::string& dir, const std::vector<std::string>& fields) {
   Json::Value res;
-  SendRequest(res, QueryBelowRequest(index_id, dir, fields));
+  SendRequest(res, wire::FindDocumentsRequest(index_id, {wire::AllBelow(dir), fields}));
   const Json::Value& data = std::as_const(res)["data"];
   FERROX_FAIL_IF_AS(!res.isMember("data") || !IsJsonArray(data), "!res.isMember(\"data\") || !res[\"data\"].isArray()",
                     Error::kBadEngineReply, toString(res));
   return data;
+}
+
+/// What changes in the document of an entry that moves to `new_path`.
+Json::Value MovedDocument(const std::string& new_path) {
+  const std::string name = Basename(new_path);
+  const std::string extension = GetFileExtension(new_path, true);
+  Json::Value document(Json::objectValue);
+  document[kKOVAMDPath] = new_path;
+  document[kKOVAMDParent] = Dirname(new_path);
+  for (const char* field : {kKOVAMDFSName, kKOVAMDSearchFileName, kKOVAMDDisplayName}) document[field] = name;
+  for (const char* field : {kKOVAMDKind, kKOVAMDExtension}) document[field] = extension;
+  return document;
+}
+
+/// One compound that moves the documents `below` (what ListBelow found at the old path) along with their folder.
+/// @throws Error kBadArgument when one lacks its name or parent.
+Json::Value MoveBelowRequest(const std::string& index_id, const std::string& new_path, const std::string& old_path,
+                             const Json::Value& below) {
+  std::vector<Json::Value> moves;
+  moves.reserve(below.size());
+  for (const Json::Value& entry : below) {
+    std::string name;
+    std::string parent;
+    GetJsonValue(name, entry, kKOVAMDFSName, true);
+    GetJsonValue(parent, entry, kKOVAMDParent, true);
+    // Deliberate: by position, whatever the parent begins with; one that is shorter is replaced whole.
+    parent.replace(0, old_path.size(), new_path);
+    Json::Value document(Json::objectValue);
+    document[kKOVAMDPath] = parent + "/" + name;
+    document[kKOVAMDParent] = parent;
+    document[kKOVAMDSearchFileName] = name;
+    moves.push_back(wire::SetDocumentRequest(index_id, entry.get(kKOVAMDPath, Json::Value()), std::move(document)));
+  }
+  return wire::CompoundRequest(std::move(moves));
 }
 
 }  // namespace
@@ -59,43 +94,50 @@ Json::Value ListBelow(const std::string& index_id, const std::string& dir, const
 std::string GetFileIndexID(const std::string& share) { return "fileindex_" + share; }
 
 void ShareIndexCreate(const std::string& share) {
-  SendRequest(CreateRequest(GetFileIndexID(share), sdk::SDKShare(share).GetDBPath()));
+  SendRequest(wire::CreateIndexRequest(GetFileIndexID(share), sdk::SDKShare(share).GetDBPath(), GetFileIndexSettings(),
+                                       GetFileIndexMappings(), GetFileIndexEventHandler()));
 }
 
-void ShareIndexPause(const std::string& share) { SendRequest(IndexRequest("index_pause", GetFileIndexID(share))); }
+void ShareIndexPause(const std::string& share) {
+  SendRequest(wire::IndexRequest("index_pause", GetFileIndexID(share)));
+}
 
-void ShareIndexResume(const std::string& share) { SendRequest(IndexRequest("index_resume", GetFileIndexID(share))); }
+void ShareIndexResume(const std::string& share) {
+  SendRequest(wire::IndexRequest("index_resume", GetFileIndexID(share)));
+}
 
-void ShareIndexDelete(const std::string& share) { SendRequest(IndexRequest("index_delete", GetFileIndexID(share))); }
+void ShareIndexDelete(const std::string& share) {
+  SendRequest(wire::IndexRequest("index_delete", GetFileIndexID(share)));
+}
 
 void ShareIndexMigrate(const std::string& share, const std::string& db_path) {
-  SendRequest(ConfigRequest(GetFileIndexID(share), "", db_path));
+  SendRequest(wire::ConfigureIndexRequest(GetFileIndexID(share), "", db_path));
 }
 
 void ShareIndexRename(const std::string& share_from, const std::string& share_to, const std::string& db_path) {
-  SendRequest(ConfigRequest(GetFileIndexID(share_from), GetFileIndexID(share_to), db_path));
+  SendRequest(wire::ConfigureIndexRequest(GetFileIndexID(share_from), GetFileIndexID(share_to), db_path));
 }
 
 void IndexUpsert(const std::string& share, const std::string& path, bool need_meta) {
-  SendRequest(UpsertRequest(GetFileIndexID(share), path, BuildDocument(path, need_meta)));
+  SendRequest(wire::UpsertDocumentRequest(GetFileIndexID(share), path, BuildDocument(path, need_meta)));
 }
 
 void IndexAttr(const std::string& share, const std::string& path) {
-  SendRequest(SetRequest(GetFileIndexID(share), path, BuildDocument(path, false)));
+  SendRequest(wire::SetDocumentRequest(GetFileIndexID(share), path, BuildDocument(path, false)));
 }
 
 void IndexDel(const std::string& share, const std::string& path) {
-  SendRequest(DocumentRequest("document_del_by_id", GetFileIndexID(share), path));
+  SendRequest(wire::DeleteDocumentRequest(GetFileIndexID(share), path));
 }
 
 void IndexDelDir(const std::string& share, const std::string& dir) {
-  SendRequest(DeleteBelowRequest(GetFileIndexID(share), dir));
+  SendRequest(wire::DeleteDocumentsRequest(GetFileIndexID(share), wire::AllBelow(dir)));
 }
 
 void IndexRename(const std::string& share, const std::string& new_path, const std::string& old_path) {
   const std::string index_id = GetFileIndexID(share);
   Json::Value res;
-  SendRequest(res, SetRequest(index_id, old_path, MovedDocument(new_path)));
+  SendRequest(res, wire::SetDocumentRequest(index_id, old_path, MovedDocument(new_path)));
   const Json::Value below = ListBelow(index_id, old_path, {kKOVAMDPath, kKOVAMDFSName, kKOVAMDParent});
   SendRequest(MoveBelowRequest(index_id, new_path, old_path, below));
 }
@@ -111,7 +153,7 @@ void IndexGetByPrefixPath(const std::string& index_id, const std::string& prefix
 
 void IndexCommit(const std::string& share_name) {
   try {
-    SendRequest(IndexRequest("commit", GetFileIndexID(share_name)));
+    SendRequest(wire::IndexRequest("commit", GetFileIndexID(share_name)));
   } catch (const Error&) {
     const sdk::SDKShare share(share_name);
     if (share.IsSpaceEnough()) throw;
@@ -122,7 +164,9 @@ void IndexCommit(const std::string& share_name) {
 }
 
 void UpdateTermSuggestion(const std::string& db_name, const std::vector<std::string>& fields) {
-  SendRequest(TermSuggestionRequest(db_name, fields));
+  std::vector<Json::Value> parts;
+  for (const std::string& field : fields) parts.push_back(wire::TermSuggestionRequest(db_name, field));
+  SendRequest(wire::CompoundRequest(std::move(parts)));
 }
 
 }  // namespace ferrox::fileindex::elastic

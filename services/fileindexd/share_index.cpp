@@ -7,6 +7,8 @@
 #include "common/log.h"
 #include "fileindex/elastic/comm.h"
 #include "fileindex/elastic/elastic_control.h"
+#include "wire/engine_requests.h"
+#include "wire/fields.h"
 #include "wire/frame_client.h"
 
 namespace ferrox::indexd {
@@ -15,23 +17,15 @@ namespace {
 
 namespace elastic = fileindex::elastic;
 
-constexpr char kPathField[] = "KOVAMDPath";
-constexpr char kStampField[] = "_KOVAStamp";
-constexpr char kNeedMetaField[] = "_KOVANeedMeta";
-constexpr char kTypeField[] = "KOVAMDContentType";
-constexpr char kVersionField[] = "_KOVAExtractVersion";
-constexpr char kErrorField[] = "_KOVAExtractError";
-constexpr char kCutField[] = "_KOVATextCut";
-
 IndexedEntry ToEntry(const Json::Value& fields) {
   IndexedEntry entry;
-  GetJsonValue(entry.path, fields, kPathField, true);
-  GetJsonValue(entry.stamp, fields, kStampField, false);
-  GetJsonValue(entry.with_content, fields, kNeedMetaField, false);
-  GetJsonValue(entry.content_type, fields, kTypeField, false);
-  GetJsonValue(entry.extract_version, fields, kVersionField, false);
-  entry.extract_failed = fields.isMember(kErrorField);
-  entry.cut_untold = fields.isMember(kCutField) && !entry.extract_failed;
+  GetJsonValue(entry.path, fields, elastic::kKOVAMDPath, true);
+  GetJsonValue(entry.stamp, fields, elastic::k_KOVAStamp, false);
+  GetJsonValue(entry.with_content, fields, elastic::k_KOVANeedMeta, false);
+  GetJsonValue(entry.content_type, fields, elastic::kKOVAMDContentType, false);
+  GetJsonValue(entry.extract_version, fields, elastic::k_KOVAExtractVersion, false);
+  entry.extract_failed = fields.isMember(elastic::k_KOVAExtractError);
+  entry.cut_untold = fields.isMember(elastic::k_KOVATextCut) && !entry.extract_failed;
   return entry;
 }
 
@@ -52,10 +46,8 @@ class Engine : public ShareIndex {
   explicit Engine(const std::string& share) : share_(share), id_(elastic::GetFileIndexID(share)) {}
 
   bool Exists() override {
-    Json::Value request = Request("index_stat");
-    Json::Value reply;
     try {
-      elastic::SendRequest(reply, request);
+      elastic::SendRequest(Request("index_stat"));
     } catch (const Error& error) {
       if (error.Code() == Error::kEngineNoSuchIndex) return false;
       throw;
@@ -82,11 +74,7 @@ class Engine : public ShareIndex {
     return since;
   }
 
-  void EndRebuilding(int64_t which) override {
-    Json::Value request = Request("index_rebuilt");
-    request["data"]["since"] = Json::Int64(which);
-    elastic::SendRequest(request);
-  }
+  void EndRebuilding(int64_t which) override { elastic::SendRequest(wire::IndexRebuiltRequest(id_, which)); }
 
   void Resume() override { elastic::ShareIndexResume(share_); }
   void Upsert(const std::string& path, bool need_meta) override { elastic::IndexUpsert(share_, path, need_meta); }
@@ -97,18 +85,13 @@ class Engine : public ShareIndex {
       if (and_below) elastic::IndexDelDir(share_, paths.front());
       return;
     }
-    Json::Value request;
+    std::vector<Json::Value> parts;
     for (const std::string& path : paths) {
-      Json::Value part = Request("document_del_by_id");
-      part["data"]["doc_id"] = path;
-      request["compound"].append(std::move(part));
-      if (!and_below) continue;
-      part = Request("document_del_by_query");
-      part["data"]["query"]["qsl"]["prefix"][kPathField] = path + "/";
-      request["compound"].append(std::move(part));
+      parts.push_back(wire::DeleteDocumentRequest(id_, path));
+      if (and_below) parts.push_back(wire::DeleteDocumentsRequest(id_, wire::AllBelow(path)));
     }
     Json::Value reply;
-    elastic::SendRequest(reply, request);
+    elastic::SendRequest(reply, wire::CompoundRequest(std::move(parts)));
     for (const Json::Value& part : reply["data"]) ThrowIfFailed(part);
   }
   void Rename(const std::string& new_path, const std::string& old_path) override {
@@ -117,26 +100,17 @@ class Engine : public ShareIndex {
   void Commit() override { elastic::IndexCommit(share_); }
 
   std::vector<IndexedEntry> List(const std::string& folder, const std::string& after, unsigned limit) override {
-    Json::Value query;
-    query["qsl"]["prefix"][kPathField] = folder + "/";
-    query["limit"] = limit;
-    if (!after.empty()) query["after"] = after;
-    return Query(std::move(query));
+    return Query(wire::AllBelow(folder), limit, after);
   }
 
-  std::vector<IndexedEntry> Find(const std::string& path) override {
-    Json::Value query;
-    query["qsl"]["term"][kPathField] = path;
-    query["limit"] = 1;
-    return Query(std::move(query));
-  }
+  std::vector<IndexedEntry> Find(const std::string& path) override { return Query(wire::OnlyAt(path), 1, ""); }
 
   std::vector<IndexedEntry> Suspects(const std::string& after, unsigned limit) override {
-    return Page("suspects", true, after, limit);
+    return Query(wire::Suspects(), limit, after);
   }
 
   std::vector<IndexedEntry> OfFile(uint64_t file, const std::string& after, unsigned limit) override {
-    return Page("file", Json::UInt64(file), after, limit);
+    return Query(wire::OfFileNumber(file), limit, after);
   }
 
   Json::Value Figures(std::chrono::milliseconds longest) override {
@@ -148,31 +122,17 @@ class Engine : public ShareIndex {
   }
 
  private:
-  Json::Value Request(const char* command) const {
-    Json::Value request;
-    request["command"] = command;
-    request["data"]["id"] = id_;
-    return request;
-  }
+  Json::Value Request(const char* command) const { return wire::IndexRequest(command, id_); }
 
-  std::vector<IndexedEntry> Page(const char* which, const Json::Value& value, const std::string& after,
-                                 unsigned limit) const {
-    Json::Value query;
-    query["qsl"][which] = value;
-    query["limit"] = limit;
-    if (!after.empty()) query["after"] = after;
-    return Query(std::move(query));
-  }
-
-  std::vector<IndexedEntry> Query(Json::Value query) const {
-    for (const char* field :
-         {kPathField, kStampField, kNeedMetaField, kTypeField, kVersionField, kErrorField, kCutField}) {
-      query["load_field"].append(field);
-    }
-    Json::Value request = Request("document_get_by_query");
-    request["data"]["query"] = std::move(query);
+  std::vector<IndexedEntry> Query(const Json::Value& which, unsigned limit, const std::string& after) const {
+    const wire::DocumentQuery query = {
+        which,
+        {elastic::kKOVAMDPath, elastic::k_KOVAStamp, elastic::k_KOVANeedMeta, elastic::kKOVAMDContentType,
+         elastic::k_KOVAExtractVersion, elastic::k_KOVAExtractError, elastic::k_KOVATextCut},
+        limit,
+        after};
     Json::Value reply;
-    elastic::SendRequest(reply, request);
+    elastic::SendRequest(reply, wire::FindDocumentsRequest(id_, query));
     const Json::Value& data = reply["data"];
     FERROX_FAIL_IF(!data.isArray(), Error::kBadEngineReply, toString(reply));
     std::vector<IndexedEntry> entries;
@@ -188,12 +148,9 @@ class Engine : public ShareIndex {
 }  // namespace
 
 std::vector<std::string> SharesBeingRebuilt() {
-  Json::Value request;
-  request["command"] = "index_list";
-  request["data"]["figures"] = false;
   const std::string prefix = elastic::GetFileIndexID("");
   std::vector<std::string> shares;
-  const wire::Reply reply = wire::AskEngine(request, std::chrono::seconds(2));
+  const wire::Reply reply = wire::AskEngine(wire::ListIndicesRequest(false), std::chrono::seconds(2));
   if (!reply.data.isArray()) return shares;
   for (const Json::Value& index : reply.data) {
     std::string id;

@@ -61,7 +61,9 @@ Type TypeNamed(const std::string& name) {
 /// The fields that a worker may set.
 Types MakeTypes() {
   const Json::Value mappings = elastic::GetFileIndexMappings();
-  Types types = {{"_KOVATextCut", Type::kBool}, {"_KOVATextEncoding", Type::kText}, {"_KOVAExtractError", Type::kText}};
+  Types types = {{elastic::k_KOVATextCut, Type::kBool},
+                 {elastic::k_KOVATextEncoding, Type::kText},
+                 {elastic::k_KOVAExtractError, Type::kText}};
   for (const char* name : elastic::kFieldNames)
     types[name] = TypeNamed(mappings["properties"][name]["type"].asString());
   for (const char* name : kFacts) types.erase(name);

@@ -19,16 +19,16 @@
 #include "services/kovacontentextractd/readers/reader.h"
 #include "services/kovacontentextractd/readers/utf8.h"
 #include "services/support/json_command.h"
+#include "wire/fields.h"
 
 namespace ferrox::extract {
 
 namespace {
 
+namespace field = fileindex::elastic;
+
 using namespace kova::content;
 
-constexpr char kErrorField[] = "_KOVAExtractError";
-constexpr char kTypeField[] = "KOVAMDContentType";
-constexpr char kCutField[] = "_KOVATextCut";
 constexpr Limits kLimits;
 /// All of a file together, so that nobody can keep a worker busy for minutes with one.
 constexpr std::chrono::seconds kAttachmentsLongest(30);
@@ -52,22 +52,22 @@ bool Says(const Json::Value& fields, const char* flag) { return fields.get(flag,
 /// Notes in the document that its text is cut, and at what, unless it says already what it lacks.
 void NoteCut(Json::Value& document, size_t text_bytes) {
   constexpr size_t kCharacterMaxBytes = 4;
-  if (!Says(document, kCutField) || document.isMember(kErrorField)) return;
+  if (!Says(document, field::k_KOVATextCut) || document.isMember(field::k_KOVAExtractError)) return;
   const bool full = text_bytes + kCharacterMaxBytes > kLimits.text_bytes;
   const std::string first = "only the first " + std::to_string(kLimits.text_bytes >> 20) + " MiB of its text";
-  document[kErrorField] = std::string(kPartlyRead) + (full ? first : "only the beginning of its text");
+  document[field::k_KOVAExtractError] = std::string(kPartlyRead) + (full ? first : "only the beginning of its text");
 }
 
 /// Notes why an attachment could not be read as the reason of the whole document, which has room for one: the first.
 void NoteReason(Json::Value& document, const std::string& reason) {
-  if (document.isMember(kErrorField)) return;
-  document[kErrorField] = (reason.starts_with(kPartlyRead) ? "" : "attachment: ") + reason;
+  if (document.isMember(field::k_KOVAExtractError)) return;
+  document[field::k_KOVAExtractError] = (reason.starts_with(kPartlyRead) ? "" : "attachment: ") + reason;
 }
 
 /// A document that only says why there is nothing else.
 Json::Value ErrorDocument(const std::string& reason) {
   Json::Value document;
-  document[kErrorField] = reason;
+  document[field::k_KOVAExtractError] = reason;
   return document;
 }
 
@@ -184,14 +184,14 @@ Json::Value Extractor::Read(int fd, std::string_view head, const std::string& pa
 /// Finds out what the file is, which is put into `document`, and has it read by who can.
 Answer Extractor::ReadFile(const Task& task, std::string_view head, Json::Value& document, const TextSink& sink) {
   const char* type = head.empty() ? TypeByExtension(task.extension) : TypeOf(task.extension, head);
-  if (type != nullptr) document[kTypeField] = type;
+  if (type != nullptr) document[field::kKOVAMDContentType] = type;
   const Format* format = type != nullptr ? FormatOf(type) : &kUnknown;
   if (head.empty() || format == nullptr) return {};
   Answer answer = ReadAs(*format, task, document, sink);
   // What only a look at the bytes of an unknown file tells.
-  const Format* second = format == &kUnknown ? FormatOf(answer.fields[kTypeField].asString()) : nullptr;
+  const Format* second = format == &kUnknown ? FormatOf(answer.fields[field::kKOVAMDContentType].asString()) : nullptr;
   if (second != nullptr && answer.text_bytes == 0) {
-    document[kTypeField] = answer.fields[kTypeField];
+    document[field::kKOVAMDContentType] = answer.fields[field::kKOVAMDContentType];
     answer = ReadAs(*second, task, document, sink);
   }
   return answer;
@@ -205,7 +205,7 @@ size_t Extractor::AddAttachments(const Answer& answer, Json::Value& document, Te
   for (const AttachedFile& attachment : answer.attachments) {
     const bool full = bytes + 1 >= kLimits.text_bytes;
     const bool late = std::chrono::steady_clock::now() > end;
-    if (full) document[kCutField] = true;
+    if (full) document[field::k_KOVATextCut] = true;
     if (late) NoteReason(document, std::string(kPartlyRead) + "not all of its attachments");
     if (full || late) break;
     if (!attachment.file.Valid()) continue;
@@ -223,8 +223,8 @@ size_t Extractor::AddAttachments(const Answer& answer, Json::Value& document, Te
     const Task task = {attachment.file.Get(), "", GetFileExtension(name, true), name, kLimits.nesting};
     const Answer found = ReadFile(task, HeadOf(task.fd), ignored, sink);
     if (found.text_bytes > 0) bytes = begin + taken;
-    if (found.text_bytes > taken || Says(found.fields, kCutField)) document[kCutField] = true;
-    const Json::Value& reason = found.fields[kErrorField];
+    if (found.text_bytes > taken || Says(found.fields, field::k_KOVATextCut)) document[field::k_KOVATextCut] = true;
+    const Json::Value& reason = found.fields[field::k_KOVAExtractError];
     if (reason.isString()) NoteReason(document, reason.asString());
     if (!found.attachments.empty()) {
       NoteReason(document, std::string(kPartlyRead) + "not the files within its attachments");
@@ -237,12 +237,13 @@ Answer Extractor::ReadAs(const Format& format, const Task& task, Json::Value& do
   Task complete = task;
   complete.reader = format.reader;
   if (pool_.Has(format.program)) {
-    document["_KOVAExtractVersion"] = format.version;
+    document[field::k_KOVAExtractVersion] = format.version;
     return pool_.Read(format.program, complete, sink);
   }
-  document["_KOVAExtractVersion"] = 0;  // so that it is read once the program is there
+  document[field::k_KOVAExtractVersion] = 0;  // so that it is read once the program is there
   Answer answer;
-  answer.fields[kErrorField] = std::string("its reader, ") + ProgramName(format.program) + ", is not installed";
+  answer.fields[field::k_KOVAExtractError] =
+      std::string("its reader, ") + ProgramName(format.program) + ", is not installed";
   return answer;
 }
 

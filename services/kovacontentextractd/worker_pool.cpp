@@ -9,6 +9,7 @@
 
 #include "common/error.h"
 #include "common/log.h"
+#include "wire/fields.h"
 
 namespace ferrox::extract {
 
@@ -147,7 +148,7 @@ Answer WorkerPool::Read(Program program, const Task& task, const TextSink& text)
   // addresses that would help the next: its successors are forked from a template with another layout.
   EndPrepared(program);
   Answer blame;
-  blame.fields["_KOVAExtractError"] = Reason(outcome);
+  blame.fields[fileindex::elastic::k_KOVAExtractError] = Reason(outcome);
   return blame;
 }
 

@@ -6,6 +6,7 @@
 
 #include "services/kovaelasticd/document.h"
 #include "services/kovaelasticd/sqlite_db.h"
+#include "wire/fields.h"
 
 namespace ferrox::engine {
 
@@ -15,7 +16,7 @@ namespace ferrox::engine {
 class FileLinks {
  public:
   /// The member of a document that tells what was seen of its file.
-  static constexpr char kStamp[] = "_KOVAStamp";
+  static constexpr auto& kStamp = fileindex::elastic::k_KOVAStamp;
 
   FileLinks(Database& database, const FieldNames& names) : database_(database), names_(names) {}
 

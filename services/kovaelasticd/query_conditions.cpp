@@ -7,6 +7,7 @@
 #include "services/kovaelasticd/query_values.h"
 #include "services/kovaelasticd/schema.h"
 #include "services/kovaelasticd/words.h"
+#include "wire/fields.h"
 
 namespace ferrox::engine {
 
@@ -82,8 +83,8 @@ QueryNode ConditionReader::WordsInField(const std::string& name, size_t begin, c
   }
   if (fields.empty()) fields.push_back(name);
   ConditionValue known = value;
-  if (fields.front() == "KOVAMDOwnerUserID") known.text = UserNumber(value);
-  if (fields.front() == "KOVAMDOwnerGroupID") known.text = GroupNumber(value);
+  if (fields.front() == fileindex::elastic::kKOVAMDOwnerUserID) known.text = UserNumber(value);
+  if (fields.front() == fileindex::elastic::kKOVAMDOwnerGroupID) known.text = GroupNumber(value);
   QueryNode node = Words(QueryNode::Type::kField, known);
   if (node.type == QueryNode::Type::kField) node.fields = std::move(fields);
   return node;

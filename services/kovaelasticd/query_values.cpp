@@ -9,10 +9,13 @@
 #include <utility>
 
 #include "services/kovaelasticd/document.h"
+#include "wire/fields.h"
 
 namespace ferrox::engine {
 
 namespace {
+
+namespace names = fileindex::elastic;
 
 constexpr int64_t kMin = std::numeric_limits<int64_t>::min();
 constexpr int64_t kMax = std::numeric_limits<int64_t>::max();
@@ -145,31 +148,31 @@ struct FriendlyName {
   std::vector<std::string> fields;
 };
 const FriendlyName kFriendlyNames[] = {
-    {"title", {"KOVAMDTitle", "KOVAMDHeadline"}},
-    {"author", {"KOVAMDAuthors", "KOVAMDCreator", "KOVAMDContributors", "KOVAMDComposer"}},
-    {"artist", {"KOVAMDAuthors", "KOVAMDComposer", "KOVAMDParticipants"}},
-    {"composer", {"KOVAMDComposer"}},
-    {"album", {"KOVAMDAlbum"}},
-    {"genre", {"KOVAMDMusicalGenre"}},
-    {"subject", {"KOVAMDTitle", "KOVAMDHeadline"}},
-    {"from", {"KOVAMDAuthors", "KOVAMDAuthorAddresses"}},
-    {"to", {"KOVAMDRecipients", "KOVAMDRecipientAddresses"}},
-    {"person", {"KOVAMDPeopleDisplayName", "KOVAMDParticipants"}},
-    {"place", {"KOVAMDNamedLocation", "KOVAMDCity", "KOVAStateOrProvince", "KOVAMDCountry"}},
-    {"publisher", {"KOVAMDPublishers", "KOVAMDOrganizations"}},
-    {"copyright", {"KOVAMDCopyright", "KOVAMDRights"}},
-    {"program", {"KOVAMDEncodingApplications", "KOVAMDAudioEncodingApplication", "KOVAMDCreator"}},
-    {"codec", {"KOVAMDCodecs"}},
-    {"rating", {"KOVAMDStarRating"}},
-    {"type", {"KOVAMDContentType"}},
-    {"keyword", {"KOVAMDKeywords", "_KOVAMDUserTags"}},
-    {"tag", {"KOVAMDKeywords", "_KOVAMDUserTags"}},
-    {"comment", {"KOVAMDComment", "KOVAMDFinderComment"}},
-    {"description", {"KOVAMDDescription", "KOVAMDHeadline"}},
-    {"camera", {"KOVAMDAcquisitionMake", "KOVAMDAcquisitionModel"}},
-    {"language", {"KOVAMDLanguages"}},
-    {"owner", {"KOVAMDOwnerUserID"}},
-    {"group", {"KOVAMDOwnerGroupID"}},
+    {"title", {names::kKOVAMDTitle, names::kKOVAMDHeadline}},
+    {"author", {names::kKOVAMDAuthors, names::kKOVAMDCreator, names::kKOVAMDContributors, names::kKOVAMDComposer}},
+    {"artist", {names::kKOVAMDAuthors, names::kKOVAMDComposer, names::kKOVAMDParticipants}},
+    {"composer", {names::kKOVAMDComposer}},
+    {"album", {names::kKOVAMDAlbum}},
+    {"genre", {names::kKOVAMDMusicalGenre}},
+    {"subject", {names::kKOVAMDTitle, names::kKOVAMDHeadline}},
+    {"from", {names::kKOVAMDAuthors, names::kKOVAMDAuthorAddresses}},
+    {"to", {names::kKOVAMDRecipients, names::kKOVAMDRecipientAddresses}},
+    {"person", {names::kKOVAMDPeopleDisplayName, names::kKOVAMDParticipants}},
+    {"place", {names::kKOVAMDNamedLocation, names::kKOVAMDCity, names::kKOVAStateOrProvince, names::kKOVAMDCountry}},
+    {"publisher", {names::kKOVAMDPublishers, names::kKOVAMDOrganizations}},
+    {"copyright", {names::kKOVAMDCopyright, names::kKOVAMDRights}},
+    {"program", {names::kKOVAMDEncodingApplications, names::kKOVAMDAudioEncodingApplication, names::kKOVAMDCreator}},
+    {"codec", {names::kKOVAMDCodecs}},
+    {"rating", {names::kKOVAMDStarRating}},
+    {"type", {names::kKOVAMDContentType}},
+    {"keyword", {names::kKOVAMDKeywords, names::k_KOVAMDUserTags}},
+    {"tag", {names::kKOVAMDKeywords, names::k_KOVAMDUserTags}},
+    {"comment", {names::kKOVAMDComment, names::kKOVAMDFinderComment}},
+    {"description", {names::kKOVAMDDescription, names::kKOVAMDHeadline}},
+    {"camera", {names::kKOVAMDAcquisitionMake, names::kKOVAMDAcquisitionModel}},
+    {"language", {names::kKOVAMDLanguages}},
+    {"owner", {names::kKOVAMDOwnerUserID}},
+    {"group", {names::kKOVAMDOwnerGroupID}},
     {"content", {field::kTextContent}},
     {"text", {field::kTextContent}},
 };
@@ -214,18 +217,21 @@ std::optional<ValueRange> ParseDurationRange(std::string_view text, int64_t /*no
 }
 
 const RangeField kRangeFields[] = {
-    {"duration", {"KOVAMDDurationSecond"}, &ParseDurationRange, "duration:>10m, duration:3m..4m30s or duration:3:25"},
-    {"year", {"KOVAMDRecordingYear"}, &ParseNumberRange, "year:1969 or year:1960..1969"},
+    {"duration",
+     {names::kKOVAMDDurationSecond},
+     &ParseDurationRange,
+     "duration:>10m, duration:3m..4m30s or duration:3:25"},
+    {"year", {names::kKOVAMDRecordingYear}, &ParseNumberRange, "year:1969 or year:1960..1969"},
     {"taken",
-     {"KOVAMDContentCreationDate"},
+     {names::kKOVAMDContentCreationDate},
      &ParseDateRange,
      "taken:2024, taken:2024-01..2024-06 or taken:>2024-01-31"},
-    {"created", {"KOVAMDContentCreationDate"}, &ParseDateRange, "created:2024 or created:2024-01..2024-06"},
-    {"pages", {"KOVAMDNumberOfPages"}, &ParseNumberRange, "pages:>100 or pages:2..10"},
-    {"width", {"KOVAMDPixelWidth"}, &ParseNumberRange, "width:>=4000 or width:640..1024"},
-    {"height", {"KOVAMDPixelHeight"}, &ParseNumberRange, "height:>=3000 or height:480..768"},
-    {"iso", {"KOVAMDISOSpeed"}, &ParseNumberRange, "iso:>=1600 or iso:100..400"},
-    {"track", {"KOVAMDAudioTrackNumber"}, &ParseNumberRange, "track:1 or track:1..3"},
+    {"created", {names::kKOVAMDContentCreationDate}, &ParseDateRange, "created:2024 or created:2024-01..2024-06"},
+    {"pages", {names::kKOVAMDNumberOfPages}, &ParseNumberRange, "pages:>100 or pages:2..10"},
+    {"width", {names::kKOVAMDPixelWidth}, &ParseNumberRange, "width:>=4000 or width:640..1024"},
+    {"height", {names::kKOVAMDPixelHeight}, &ParseNumberRange, "height:>=3000 or height:480..768"},
+    {"iso", {names::kKOVAMDISOSpeed}, &ParseNumberRange, "iso:>=1600 or iso:100..400"},
+    {"track", {names::kKOVAMDAudioTrackNumber}, &ParseNumberRange, "track:1 or track:1..3"},
 };
 
 }  // namespace

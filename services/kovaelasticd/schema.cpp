@@ -10,9 +10,12 @@ namespace ferrox::engine {
 
 namespace {
 
+namespace names = fileindex::elastic;
+
 /// Found by their own means, or of no use to anybody who searches.
-constexpr const char* kNotPlain[] = {field::kFsName,      field::kSearchName,  field::kDisplayName,    field::kKind,
-                                     field::kTextContent, "KOVAMDContentType", "KOVAMDContentTypeTree"};
+constexpr const char* kNotPlain[] = {
+    field::kFsName,      field::kSearchName,        field::kDisplayName,          field::kKind,
+    field::kTextContent, names::kKOVAMDContentType, names::kKOVAMDContentTypeTree};
 // Facts about a file with conditions of their own (path:, size:, date:), or numbers that nobody types.
 constexpr const char* kNotSearchable[] = {field::kPath,
                                           field::kParent,
@@ -25,21 +28,22 @@ constexpr const char* kNotSearchable[] = {field::kPath,
                                           field::kSize,
                                           field::kContentChangeDate,
                                           field::kTextContent,
-                                          "KOVAMDAttributeChangeDate",
-                                          "KOVAMDFSCreationDate",
-                                          "KOVAMDContentModificationDate",
-                                          "KOVAMDContentCreationDate",
-                                          "KOVAMDLastUsedDate",
-                                          "KOVAMDFinderOpenDate",
-                                          "KOVAMDDateAdded",
-                                          "KOVAMDLogicalSize",
-                                          "KOVAMDPhysicalSize",
-                                          "KOVAMDPrivilege"};
+                                          names::kKOVAMDAttributeChangeDate,
+                                          names::kKOVAMDFSCreationDate,
+                                          names::kKOVAMDContentModificationDate,
+                                          names::kKOVAMDContentCreationDate,
+                                          names::kKOVAMDLastUsedDate,
+                                          names::kKOVAMDFinderOpenDate,
+                                          names::kKOVAMDDateAdded,
+                                          names::kKOVAMDLogicalSize,
+                                          names::kKOVAMDPhysicalSize,
+                                          names::kKOVAMDPrivilege};
 
 // Each of these adds a word to every document that has it (RangeWord).
-constexpr const char* kRanged[] = {"KOVAMDDurationSecond", "KOVAMDRecordingYear",   "KOVAMDContentCreationDate",
-                                   "KOVAMDNumberOfPages",  "KOVAMDPixelWidth",      "KOVAMDPixelHeight",
-                                   "KOVAMDISOSpeed",       "KOVAMDAudioTrackNumber"};
+constexpr const char* kRanged[] = {
+    names::kKOVAMDDurationSecond, names::kKOVAMDRecordingYear,   names::kKOVAMDContentCreationDate,
+    names::kKOVAMDNumberOfPages,  names::kKOVAMDPixelWidth,      names::kKOVAMDPixelHeight,
+    names::kKOVAMDISOSpeed,       names::kKOVAMDAudioTrackNumber};
 
 template <size_t Count>
 bool IsOneOf(const char* const (&names)[Count], const std::string& name) {

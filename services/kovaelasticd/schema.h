@@ -6,23 +6,25 @@
 
 #include <json/value.h>
 
+#include "wire/fields.h"
+
 namespace ferrox::engine {
 
 /// The members of a document that the engine itself knows.
 namespace field {
-inline constexpr char kPath[] = "KOVAMDPath";
-inline constexpr char kParent[] = "KOVAMDParent";
-inline constexpr char kFsName[] = "KOVAMDFSName";
-inline constexpr char kSearchName[] = "KOVAMDSearchFileName";
-inline constexpr char kDisplayName[] = "KOVAMDDisplayName";
-inline constexpr char kKind[] = "KOVAMDKind";
-inline constexpr char kExtension[] = "KOVAMDExtension";
-inline constexpr char kIsDir[] = "KOVAMDIsDir";
-inline constexpr char kSize[] = "KOVAMDFSSize";
-inline constexpr char kContentChangeDate[] = "KOVAMDFSContentChangeDate";
-inline constexpr char kTextContent[] = "KOVAMDTextContent";
-inline constexpr char kTitle[] = "KOVAMDTitle";
-inline constexpr char kExtractError[] = "_KOVAExtractError";
+inline constexpr auto& kPath = fileindex::elastic::kKOVAMDPath;
+inline constexpr auto& kParent = fileindex::elastic::kKOVAMDParent;
+inline constexpr auto& kFsName = fileindex::elastic::kKOVAMDFSName;
+inline constexpr auto& kSearchName = fileindex::elastic::kKOVAMDSearchFileName;
+inline constexpr auto& kDisplayName = fileindex::elastic::kKOVAMDDisplayName;
+inline constexpr auto& kKind = fileindex::elastic::kKOVAMDKind;
+inline constexpr auto& kExtension = fileindex::elastic::kKOVAMDExtension;
+inline constexpr auto& kIsDir = fileindex::elastic::kKOVAMDIsDir;
+inline constexpr auto& kSize = fileindex::elastic::kKOVAMDFSSize;
+inline constexpr auto& kContentChangeDate = fileindex::elastic::kKOVAMDFSContentChangeDate;
+inline constexpr auto& kTextContent = fileindex::elastic::kKOVAMDTextContent;
+inline constexpr auto& kTitle = fileindex::elastic::kKOVAMDTitle;
+inline constexpr auto& kExtractError = fileindex::elastic::k_KOVAExtractError;
 }  // namespace field
 
 /// How the fields of an index's documents are checked and searched, from the mappings that the index was created with.

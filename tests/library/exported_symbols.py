@@ -19,7 +19,7 @@ EXPECTED = ["ferrox::Error::what() const", "ferrox::LockFile::~LockFile()", "fer
             "ferrox::fileindex::FolderMgr::FolderMgr()", "ferrox::fileindex::Folder::GetStatus(",
             "ferrox::fileindex::log_level"]
 STANDARD = re.compile(r"^(\S+ )*?(typeinfo (name )?for |vtable for |guard variable for )?(std::|__gnu_cxx::|operator)")
-INTERNAL_HEADERS = {"custom_event.h", "file_types.h", "folder_rule.h", "folder_share.h", "operation_steps.h", "related_services.h", "requests.h"}
+INTERNAL_HEADERS = {"custom_event.h", "file_types.h", "folder_rule.h", "folder_share.h", "operation_steps.h", "related_services.h"}
 
 
 def main(library, header_folder):
