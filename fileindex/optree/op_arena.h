@@ -18,13 +18,19 @@
 namespace ferrox::fileindex {
 
 /// Memory for the nodes and operations of one tree: cut from large chunks, given back as a whole when the tree and the
-/// last object from it are gone. The tree's thread allocates; any thread may release.
+/// last object from it are gone. A tree of a million operations has two million objects of like age, which a heap would
+/// take one by one. The tree's thread allocates; any thread may release, since callers keep objects where they like.
+///
+/// Objects are counted so that the common case, Release, is one atomic operation and Allocate none: while the tree
+/// lives, `balance_` falls below zero by what was released, and Close adds what was allocated. Whoever then brings it
+/// to zero, Close or a Release, deletes the arena.
 class OPArena {
  public:
   OPArena() = default;
   OPArena(const OPArena&) = delete;
   OPArena& operator=(const OPArena&) = delete;
 
+  /// Uninitialized memory of at most kFirstChunkBytes. @throws std::bad_alloc.
   void* Allocate(size_t bytes, size_t alignment) {
     ++allocated_;
     size_t start = (used_ + alignment - 1) & ~(alignment - 1);
@@ -51,14 +57,15 @@ class OPArena {
  private:
   ~OPArena() = default;
 
+  // Each chunk is twice the one before, so that a small tree wastes little and a large one has few chunks.
   static constexpr size_t kFirstChunkBytes = 4096;
   static constexpr size_t kMaxChunkBytes = 1024 * 1024;
 
-  std::vector<std::unique_ptr<char[]>> chunks_;
-  size_t chunk_bytes_ = 0;
-  size_t used_ = 0;
-  ptrdiff_t allocated_ = 0;
-  std::atomic<ptrdiff_t> balance_{0};  // minus the objects released; from Close on, the objects still there
+  std::vector<std::unique_ptr<char[]>> chunks_;  ///< the last is the one that is cut from
+  size_t chunk_bytes_ = 0;                       ///< its size,
+  size_t used_ = 0;                              ///< and what of it is taken
+  ptrdiff_t allocated_ = 0;                      ///< objects so far; of the tree's thread alone
+  std::atomic<ptrdiff_t> balance_{0};            ///< minus the objects released; from Close on, the objects still there
 };
 
 /// For std::allocate_shared from an arena. Sanitizers see each object as one of the heap's, so that they notice its

@@ -9,6 +9,7 @@ namespace ferrox::fileindex {
 
 namespace {
 
+/// The key of this process, drawn when the first name is hashed.
 struct HashKey {
   uint64_t k0 = 0x0706050403020100u;
   uint64_t k1 = 0x0f0e0d0c0b0a0908u;
@@ -43,7 +44,8 @@ struct SipState {
 
 }  // namespace
 
-// SipHash-1-3.
+// SipHash-1-3: eight bytes a round, then the rest with the length, then three rounds more. Fast for the short names of
+// files, and without the key nobody can tell which names collide.
 uint32_t HashName(std::string_view name) {
   static const HashKey key;
   SipState state = {key.k0 ^ 0x736f6d6570736575u, key.k1 ^ 0x646f72616e646f6du, key.k0 ^ 0x6c7967656e657261u,
@@ -66,6 +68,7 @@ uint32_t HashName(std::string_view name) {
   return static_cast<uint32_t>(hash ^ (hash >> 32));
 }
 
+/// Linear probing: from the slot that the hash names onwards, up to the first free one.
 OPNode* OPBranch::Find(const OPNode& node, std::string_view name, uint32_t hash) {
   if (capacity_ == 0) {
     const bool is_first = !node.children.empty() && first_hash_ == hash && node.children.front()->name == name;
@@ -82,6 +85,7 @@ OPNode* OPBranch::Find(const OPNode& node, std::string_view name, uint32_t hash)
 
 void OPBranch::Added(const OPNode& node, uint32_t hash) {
   const auto count = static_cast<uint32_t>(node.children.size());
+  // A single child is compared as it is; the table begins with the second.
   if (count == 1) {
     first_hash_ = hash;
     return;
@@ -102,6 +106,7 @@ void OPBranch::Grow(size_t count) {
   }
 }
 
+/// Takes the first free slot from the one that the hash names. There is one: the table is never full.
 void OPBranch::Put(Slot entry) {
   const uint32_t mask = capacity_ - 1;
   uint32_t at = entry.hash & mask;

@@ -9,7 +9,9 @@
 
 namespace ferrox::fileindex {
 
-/// What a node with children keeps beside them.
+/// What a node with children keeps beside them: a hash table of their names, and the chains of those that have
+/// something pending. The table holds positions, not names: a slot is eight bytes, and the name is compared only where
+/// all 32 bits of the hash agree. Most folders in a queue have one child, for which no table is made.
 struct OPBranch {
   /// The child of that name, or null. `hash` is HashName(name).
   OPNode* Find(const OPNode& node, std::string_view name, uint32_t hash);
@@ -22,15 +24,15 @@ struct OPBranch {
  private:
   struct Slot {
     uint32_t hash;
-    uint32_t child;  // its position plus one; 0 in a free slot
+    uint32_t child;  ///< its position plus one; 0 in a free slot
   };
 
   void Grow(size_t count);
   void Put(Slot entry);
 
-  std::unique_ptr<Slot[]> slots_;  // at most three quarters taken; none for a single child
-  uint32_t capacity_ = 0;          // a power of two, or none
-  uint32_t first_hash_ = 0;        // of the first child's name
+  std::unique_ptr<Slot[]> slots_;  ///< at most three quarters taken; none for a single child
+  uint32_t capacity_ = 0;          ///< a power of two, or 0 without slots
+  uint32_t first_hash_ = 0;        ///< of the first child's name
 };
 
 /// A hash with a key of this process: whoever may name files must not be able to choose names that collide.

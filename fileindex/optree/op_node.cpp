@@ -9,6 +9,7 @@ OPNode::OPNode(std::shared_ptr<OPNode> parent_node, std::string node_name)
     : name(std::move(node_name)), parent(std::move(parent_node)) {}
 
 OPNode::~OPNode() {
+  // A node that outlives its tree may be the last to hold the way up, as long as that is.
   // One by one: the ancestors that only this node kept would otherwise be destroyed inside each other.
   std::shared_ptr<OPNode> up = std::move(parent);
   while (up != nullptr && up.use_count() == 1) up = std::move(up->parent);
@@ -33,6 +34,7 @@ OPNode& OPNode::ChildOf(std::string_view child_name, OPArena* arena) {
   return child;
 }
 
+/// Goes up twice, for the length and for the names from the end on, so that one allocation does.
 std::string OPNode::GetPath() const {
   size_t length = name.size();
   for (const OPNode* node = parent.get(); node != nullptr; node = node->parent.get()) length += node->name.size() + 1;
@@ -46,6 +48,7 @@ std::string OPNode::GetPath() const {
   return path;
 }
 
+/// Of a copy, since `fn` may queue further operations; whether one is cancelled is asked when its turn comes.
 void OPNode::TraverseOP(const std::function<void(std::shared_ptr<OP>)>& fn) {
   const std::vector<std::shared_ptr<OP>> copy = ops;
   for (const auto& op : copy) {

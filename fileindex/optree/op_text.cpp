@@ -22,6 +22,8 @@ bool IsBool(const Json::Value& flag) { return flag.isBool(); }
 OP::OP(std::shared_ptr<OPNode> op_node, FileIndexOP kind, const std::string& old_path, const Json::Value& flags)
     : node(std::move(op_node)), op(kind), path(old_path), data(flags) {}
 
+/// A flag that is there already must be a bool to count; an incoming one, which a line of the queue brought, whatever
+/// reads as one.
 void OP::MergeData(const Json::Value& incoming) {
   for (const char* key : {"document", "audio", "video", "photo"}) {
     const bool on = HasFlag(incoming, key, &isJsonType<bool>) || HasFlag(data, key, &IsBool);

@@ -20,6 +20,7 @@ namespace ferrox::fileindex {
 namespace {
 
 constexpr int kDebugLevel = 7;
+/// Longer texts than this are cut in logs.
 constexpr size_t kLoggedTextMaxBytes = 2048;
 
 const Json::Value kNullData;
@@ -51,6 +52,7 @@ void LogBadLine(const char* function, int line, std::string_view event_raw, cons
   }
 }
 
+/// How many bytes the two begin with alike. Paths of neighbouring lines share most of theirs, hence by words.
 size_t CommonPrefixLength(std::string_view a, std::string_view b) {
   const size_t most = std::min(a.size(), b.size());
   size_t same = 0;
@@ -78,8 +80,11 @@ OPTree::OPTree(const std::string& path) : queue_path(path), root(newClass<OPNode
 
 OPTree::~OPTree() { BreakCycles(); }
 
-/// Parents and children, nodes and operations hold each other; who keeps an operation or a node beyond the tree needs
-/// the way up only.
+/// Parents and children, nodes and operations hold each other by shared pointers; without this nothing would ever be
+/// freed. What a caller keeps beyond the tree needs the way up only, for its path: pointers down go, those up stay.
+///
+/// The walk has no stack and no recursion, since a queue may hold paths as deep as it likes. It is bound by memory, so
+/// the sibling that comes next is fetched while its brother is taken apart.
 void OPTree::BreakCycles() noexcept {
   spare_.reset();
   ops.clear();
@@ -105,6 +110,7 @@ void OPTree::BreakCycles() noexcept {
   arena_->Close();
 }
 
+/// A line that cannot be folded costs itself and nothing else. After a crash marker the others do not count.
 void OPTree::BuildTree() {
   EventLineReader reader(queue_path);
   FERROX_FAIL_IF_AS(!reader.Valid(), "!input_stream", Error::kInternal, "Failed to open queue, reason=" + ErrnoText());
@@ -122,6 +128,7 @@ void OPTree::BuildTree() {
   }
 }
 
+/// Lines of the plain form are folded where they lie in the reader's buffer; any other becomes an Event first.
 void OPTree::InsertLine(std::string_view line) {
   EventFields fields;
   if (line.size() <= kQueueLineMaxBytes && ScanPlainEvent(line, fields)) {
@@ -137,7 +144,9 @@ void OPTree::InsertEvent(std::shared_ptr<Event> event) {
 
 void OPTree::Insert(const EventFields& event, const Json::Value& data) {
   OPNode& node = FindNode(event.path);
-  // Only now, before this event's own operation is in the list, is an entry at its front settled for good.
+  // No rule applies to cancelled operations and renames, and neither ever changes again: those at the front of the list
+  // need not be visited by later events, or a file that is written and renamed all day would cost more each time. Only
+  // now, before this event's own operation is in the list, is an entry at its front settled for good.
   while (node.settled_ < node.ops.size() &&
          (node.ops[node.settled_]->op == OP_NONE || node.ops[node.settled_]->op == OP_RENAME)) {
     ++node.settled_;
@@ -146,7 +155,8 @@ void OPTree::Insert(const EventFields& event, const Json::Value& data) {
   if ((event.event & EVENT_QUEUE_CRASHED) != 0) crashed = true;
 }
 
-/// A new operation of the node. One that the event before did not queue serves again.
+/// A new operation of the node. One that the event before did not queue serves again: of repeated writes to one file,
+/// all but the first need none. "Not queued" shows in its use count, which nobody else changes meanwhile.
 std::shared_ptr<OP> OPTree::TakeSpareOP(OPNode& node) {
   if (spare_ == nullptr || spare_.use_count() != 1) {
     spare_ =
@@ -162,6 +172,9 @@ std::shared_ptr<OP> OPTree::TakeSpareOP(OPNode& node) {
 
 std::shared_ptr<OPNode> OPTree::GetNodeByPath(const std::string& path) { return FindNode(path).shared_from_this(); }
 
+/// Walks down from the deepest node that the path shares with the one found last, making what is missing. The steps of
+/// that walk are kept in trail_: `end` is where a step's component ends in the path, so that a step is shared when the
+/// common beginning reaches to its end and a slash, or the end of the path, follows there.
 OPNode& OPTree::FindNode(std::string_view path) {
   const size_t same = CommonPrefixLength(path, trail_path_);
   while (!trail_.empty() &&
@@ -190,6 +203,8 @@ OPNode& OPTree::FindNode(std::string_view path) {
   return *node;
 }
 
+/// Without recursion, as in BreakCycles. `fn` may add nodes; those added to a node that the walk has come to are passed
+/// over, those below one that it has yet to reach are visited.
 void OPTree::TraverseNodeDescendant(std::shared_ptr<OPNode> node,
                                     const std::function<void(std::shared_ptr<OPNode>)>& fn, bool skip_self) {
   struct Visit {
@@ -213,6 +228,7 @@ void OPTree::TraverseNodeDescendant(std::shared_ptr<OPNode> node,
   }
 }
 
+/// By index, since `fn` may insert events, whose operations come at the end and are handed out as well.
 int OPTree::ProcessOP(const std::function<void(std::shared_ptr<OP>)>& fn) {
   if (crashed) {
     Log(LOG_WARNING, "%s:%d Queue crashed: %s", ModuleName(__FILE__).c_str(), __LINE__, queue_path.c_str());

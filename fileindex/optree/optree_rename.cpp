@@ -4,7 +4,9 @@
 #include "common/new_class.h"
 #include "fileindex/optree/optree.h"
 
-// How a rename takes what is pending under the old name along to the new one.
+// How a rename takes what is pending under the old name along to the new one. The index daemon carries operations out
+// in their order, looking at the disk as it is by then: an event of the old name that came before the rename has
+// nothing to look at there any more, so its operation moves to where the file is now.
 
 namespace ferrox::fileindex {
 
@@ -22,6 +24,9 @@ std::vector<std::shared_ptr<OP>> TakeOut(std::vector<std::shared_ptr<OP>>& ops, 
 
 }  // namespace
 
+/// `node` is the new place; `op`, the rename, has the old path. In the end the node's list reads: what it had before,
+/// what came from the old node, the rename, and last the content work of the old node, which is to be done on the
+/// document that the rename brings along.
 void OPTree::Rename(OPNode& node, const std::shared_ptr<OP>& op) {
   const std::string old_path = op->path;
   const std::string new_path = node.GetPath();
@@ -55,23 +60,25 @@ FileIndexOP OPTree::MoveOwn(OPNode& from, OPNode& to) {
   return carried;
 }
 
-/// Whether the nodes below get their counterparts under a new name also where nothing is pending. Their order of
-/// creation decides the order of later walks, which shows only after renames into themselves or their own ancestors,
-/// as no kernel makes them; so that is kept up while it is cheap and then left.
-bool OPTree::CanAffordIdle(OPNode& old_node) {
+/// Whether also the idle nodes below get their counterparts (see OPTree). Counts the nodes below against what is left,
+/// and stops as soon as that is used up, which it then stays.
+bool OPTree::MayVisitIdle(OPNode& old_node) {
   std::vector<const OPNode*> open = {&old_node};
-  while (!open.empty() && idle_budget_ != 0) {
+  while (!open.empty() && idle_nodes_left_ != 0) {
     const OPNode* const node = open.back();
     open.pop_back();
-    idle_budget_ -= std::min(idle_budget_, node->children.size());
-    if (idle_budget_ == 0) break;
+    idle_nodes_left_ -= std::min(idle_nodes_left_, node->children.size());
+    if (idle_nodes_left_ == 0) break;
     for (const auto& child : node->children) open.push_back(child.get());
   }
-  return idle_budget_ != 0;
+  return idle_nodes_left_ != 0;
 }
 
+/// Moves what is pending below the old node, the deepest nodes first. While it goes on, the tree grows: FindNode makes
+/// the counterparts. Where these lie apart from the old node, as after each rename that a kernel makes, the walk does
+/// not meet them, and it is enough to visit the nodes with movable operations.
 void OPTree::MoveBelow(OPNode& old_node, const std::string& old_path, const std::string& new_path) {
-  const bool with_idle = CanAffordIdle(old_node);
+  const bool with_idle = MayVisitIdle(old_node);
   const auto move = [&](const std::shared_ptr<OPNode>& node) { MoveAlong(*node, old_path, new_path, with_idle); };
   if (base::IsAtOrBelow(new_path, old_path)) {
     // The nodes are listed first, or the walk would go on into those that it makes.
@@ -96,6 +103,8 @@ void OPTree::MoveAlong(OPNode& node, const std::string& old_path, const std::str
   Take(target, TakeOut(node.ops, [](const OP& op) { return op.op >= OP_UPSERT; }));
 }
 
+/// Appends the operations to the node's, in their order, and tells them that they are its. Their places in the tree's
+/// own list do not change.
 void OPTree::Take(OPNode& to, const std::vector<std::shared_ptr<OP>>& moved) {
   if (moved.empty()) return;
   const std::shared_ptr<OPNode> node = to.shared_from_this();

@@ -10,6 +10,10 @@
 #include "fileindex/queue/event_scan.h"
 
 // How an event is folded into what is pending already for its path and, of folders, below it.
+//
+// The index daemon looks at the disk when it carries an operation out, which is after all events of the queue. So it
+// does not matter when a file was written, only whether it is looked at once more: the table below keeps, of all that
+// happened to a path, what makes the daemon look at as much as it must.
 
 namespace ferrox::fileindex {
 
@@ -145,7 +149,9 @@ void OPTree::Queue(OPNode& node, const std::shared_ptr<OP>& op) {
   Mark(node, op->op);
 }
 
-/// Sets the bits of the classes of `op`, which the node now holds, on it and on its ancestors.
+/// Sets the bits of the classes of `op`, which the node now holds, on it and on its ancestors, and puts each into its
+/// parent's chain. Stops at the first node that has the bit: so do all above it. Amortized, a node is marked once for
+/// each time that it was unmarked.
 void OPTree::Mark(OPNode& node, FileIndexOP op) {
   for (const LiveClass live_class : {kCancellable, kMovable}) {
     if (!(live_class == kMovable ? IsMovable(op) : IsCancellable(op))) continue;
@@ -190,7 +196,8 @@ std::vector<OPNode*> OPTree::NodesBelow(OPNode& top, LiveClass live_class) {
   return nodes;
 }
 
-/// Takes the class's bit from those of NodesBelow that hold no such operation any more.
+/// Takes the class's bit from those of NodesBelow that hold no such operation any more, and takes them out of the
+/// chains. Children come before their parents in the list, so a parent whose children all lost the bit loses it too.
 void OPTree::Unmark(OPNode& top, const std::vector<OPNode*>& below, LiveClass live_class) {
   const auto drop_idle_children = [live_class](OPNode& node) {
     if (node.branch_ == nullptr) return false;

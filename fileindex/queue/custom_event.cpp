@@ -30,6 +30,8 @@ namespace {
 /// what the event reports happened, so the event would add nothing.
 using IsCovered = std::function<bool(const std::string& queue_path)>;
 
+/// Appends the line unless a waiting reindex covers it. That is asked without the lock, which is held for the writing
+/// alone; a reindex in the detached queue counts as waiting, also while it is carried out.
 void QueueEvent(const std::string& queue_path, const std::string& path, const std::string& line,
                 const IsCovered& is_covered) {
   if (is_covered(queue_path)) return;
@@ -43,6 +45,7 @@ void QueueEvent(const std::string& queue_path, const std::string& path, const st
 void QueueOrMark(const std::string& path, const std::string& line, const IsCovered& is_covered) {
   std::string share_name;
   std::string share_path;
+  // Whatever fails, the change must reach the index: by the mark, the whole share is compared with the disk.
   try {
     GetShareNamePathByFullPath(share_name, share_path, path);
     QueueEvent(sdk::SDKShare(share_name).GetQueuePath(), path, line, is_covered);
@@ -58,7 +61,8 @@ void QueueOrMark(const std::string& path, const std::string& line, const IsCover
 
 }  // namespace
 
-/// The reindexes that a share's queues held when this was made, and those of the writer since.
+/// The reindexes that a share's queues held when this was made, and those of the writer since. It answers as a search
+/// of the queues would, but they are read once.
 class QueuedReindexes {
  public:
   explicit QueuedReindexes(const std::string& queue_path) {

@@ -13,6 +13,7 @@ namespace {
 
 bool HasNul(const std::string& text) { return text.find('\0') != std::string::npos; }
 
+/// The limit and the NUL are asked first: the JSON library would read both, the NUL as the end of a text.
 bool ParseLine(Json::Value& data, const std::string& event_raw) {
   return event_raw.size() <= kQueueLineMaxBytes && !HasNul(event_raw) && fromString(data, event_raw);
 }
@@ -20,6 +21,7 @@ bool ParseLine(Json::Value& data, const std::string& event_raw) {
 }  // namespace
 
 Event::Event(const std::string& event_raw) {
+  // The plain form first. Where it reads a line, the JSON library would read the same.
   EventFields plain;
   if (event_raw.size() <= kQueueLineMaxBytes && ScanPlainEvent(event_raw, plain)) {
     event = plain.event;

@@ -15,6 +15,8 @@ namespace ferrox::fileindex {
 
 namespace {
 
+/// Of one read. The buffer holds the longest line and one read more, so that Fill has room for a whole read whenever it
+/// is called: what is then held is at most a line.
 constexpr size_t kReadBytes = 64 * 1024;
 constexpr size_t kBufferBytes = kQueueLineMaxBytes + kReadBytes;
 
@@ -23,6 +25,8 @@ constexpr size_t kBufferBytes = kQueueLineMaxBytes + kReadBytes;
 EventLineReader::EventLineReader(const std::string& queue_path)
     : buffer_(new char[kBufferBytes]), file_(open(queue_path.c_str(), O_RDONLY | O_CLOEXEC)) {}
 
+/// Bytes that were searched for a newline once are not searched again when more has come: a line that arrives in pieces
+/// costs its length, not its square.
 bool EventLineReader::Next(std::string_view& line) {
   if (skipping_) SkipRestOfLine();
   size_t searched = 0;
@@ -31,6 +35,7 @@ bool EventLineReader::Next(std::string_view& line) {
     const size_t held = end_ - start_;
     const auto* newline = static_cast<const char*>(memchr(start + searched, '\n', held - searched));
     const size_t length = newline != nullptr ? static_cast<size_t>(newline - start) : held;
+    // Also when its end has not been read yet: what is held of it is enough to refuse it.
     if (length > kQueueLineMaxBytes) {
       line = {start, kQueueLineMaxBytes + 1};
       start_ += line.size();
@@ -42,6 +47,7 @@ bool EventLineReader::Next(std::string_view& line) {
       start_ += length + 1;
       return true;
     }
+    // At the end of the file, what is left is the last line, unless it is empty.
     searched = held;
     if (!Fill()) {
       line = {buffer_.get() + start_, held};
@@ -66,6 +72,7 @@ bool EventLineReader::Fill() {
   return got > 0;
 }
 
+/// Reads up to behind the newline of the line that was cut short, or to the end, keeping nothing.
 void EventLineReader::SkipRestOfLine() {
   skipping_ = false;
   for (;;) {

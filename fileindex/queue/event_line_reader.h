@@ -27,9 +27,9 @@ class EventLineReader {
 
   std::unique_ptr<char[]> buffer_;
   base::UniqueFd file_;
-  size_t start_ = 0;  // what was read and not handed out yet is [start_, end_)
+  size_t start_ = 0;  ///< what was read and not handed out yet is [start_, end_) of the buffer
   size_t end_ = 0;
-  bool skipping_ = false;  // the rest of a line that is too long comes next
+  bool skipping_ = false;  ///< the rest of a line that is too long comes next
 };
 
 }  // namespace ferrox::fileindex

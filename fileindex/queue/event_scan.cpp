@@ -9,6 +9,10 @@ namespace {
 
 enum Member : unsigned { kNone = 0, kEvent = 1, kIsDir = 2, kPath = 4, kPathOld = 8, kData = 16 };
 
+// A text is searched for its end eight bytes at a time: a word has a zero byte exactly if
+// (word - kEachByte) & ~word & kHighBits is not 0, and a byte below 0x20 exactly if (word - kEachByte * 0x20) & ~word &
+// kHighBits is not 0. A byte of 0x80 or more, as in UTF-8, is neither. Bytes above the first hit may be reported in
+// error, by the borrow; since the end is then searched byte by byte, that costs no correctness.
 constexpr uint64_t kEachByte = 0x0101010101010101u;
 constexpr uint64_t kHighBits = kEachByte * 0x80;
 
@@ -22,10 +26,13 @@ bool HasTextEnd(uint64_t word) {
 
 bool IsTextEnd(char c) { return c == '"' || c == '\\' || static_cast<unsigned char>(c) < 0x20; }
 
+/// Reads one line from left to right, without going back and without memory of its own. What it does not know, even
+/// where JSON allows it (an escape, a further member, a number such as 6.4e1), ends the scan with false.
 class Scanner {
  public:
   explicit Scanner(std::string_view line) : at_(line.data()), end_(at_ + line.size()) {}
 
+  /// "fields" may be partly filled when this fails.
   bool Scan(EventFields& fields) {
     if (!Take('{')) return false;
     unsigned seen = 0;
@@ -53,6 +60,7 @@ class Scanner {
     return true;
   }
 
+  /// Steps over exactly this text, if it is next.
   template <size_t size>
   bool TakeText(const char (&text)[size]) {
     constexpr size_t kLength = size - 1;
@@ -93,6 +101,8 @@ class Scanner {
     }
   }
 
+  /// A natural number of 32 bits, as JSON writes it: no sign, no leading zero. Eleven digits are read at most, which is
+  /// one more than such a number has.
   bool ReadNumber(uint32_t& number) {
     const char* const start = at_;
     uint64_t value = 0;
@@ -104,6 +114,7 @@ class Scanner {
     return at_ != start && !has_leading_zero && value <= UINT32_MAX;
   }
 
+  /// A text without escapes: what it says lies in the line as it is.
   bool ReadText(std::string_view& text) {
     if (at_ == end_ || *at_ != '"') return false;
     const char* const start = ++at_;
@@ -120,7 +131,7 @@ class Scanner {
     return true;
   }
 
-  const char* at_;
+  const char* at_;  ///< what is to be read next
   const char* end_;
 };
 

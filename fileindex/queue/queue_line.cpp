@@ -10,6 +10,7 @@ namespace ferrox::fileindex {
 
 namespace {
 
+/// What JSON does not allow in a text as it is. Bytes above 0x7f stay, be they UTF-8 or not.
 bool NeedsEscape(char c) { return static_cast<unsigned char>(c) < 0x20 || c == '"' || c == '\\'; }
 
 void AppendEscaped(std::string& text, char c) {
@@ -47,6 +48,7 @@ std::string CustomEventLine(int event, const std::string& path, const std::strin
   return toString(line) + "\n";
 }
 
+/// Written piece by piece into the caller's buffer, which collects the lines of one write.
 void AppendChangeLine(std::string& text, uint32_t event, bool is_folder, std::string_view path,
                       std::string_view path_old) {
   text += "{\"event\":";

@@ -32,6 +32,9 @@ void QueueMgr::DeleteTmp() {
   op_tree_tmp_.reset();
 }
 
+/// Whether there is a detached queue is asked under the lock: two that detach at the same time would otherwise both see
+/// none, and the second's rename would replace the queue of the first. The lock goes with its file to the new name;
+/// writers that wait for it then see that it is no longer at the live queue's path, and make a new one.
 bool QueueMgr::PrepareTmpQueue() {
   if (!IsFileExist(queue_path_)) return IsFileExist(queue_path_tmp_);
   const LockFile lock(queue_path_, true);
@@ -42,6 +45,8 @@ bool QueueMgr::PrepareTmpQueue() {
   return true;
 }
 
+// Trees are kept: a queue of a million lines takes a second to fold, and callers ask more than once. The live queue's
+// is that of the moment at which it was first asked for.
 std::shared_ptr<OPTree> QueueMgr::GetOPTree() const {
   if (op_tree_ == nullptr) op_tree_ = newClass<OPTree>(queue_path_);
   return op_tree_;
@@ -73,10 +78,14 @@ bool QueueMgr::IsFullPathHasReindex(const std::string& full_path) {
   return FindQueues(covers);
 }
 
+/// The live queue first: what is detached in between is then found in the detached one. In the other order an event
+/// could pass from one to the other unseen.
 bool QueueMgr::FindQueues(const std::function<bool(std::shared_ptr<Event>)>& pred) const {
   return FindQueue(pred, queue_path_) || FindQueue(pred, queue_path_tmp_);
 }
 
+/// Whether `pred` accepts a line of the file; ends with the first. Nothing is folded: an event counts also where a
+/// later one makes it void. A bad line ends the search by its error, since what it would have said is not known.
 bool QueueMgr::FindQueue(const std::function<bool(std::shared_ptr<Event>)>& pred, const std::string& path) {
   if (!IsFileExist(path)) return false;
   EventLineReader reader(path);
