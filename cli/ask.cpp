@@ -20,11 +20,14 @@ using wire::Outcome;
 
 /// A command that must first wait for other work still answers within this.
 constexpr std::chrono::seconds kLongestWait(120);
+/// Somebody waits at a terminal: an engine that takes longer than this hangs.
 constexpr std::chrono::seconds kSearchWait(20);
+/// A status is answered from memory.
 constexpr std::chrono::seconds kStateWait(5);
 
+/// How a daemon is reached, and how it is called where it fails.
 struct Daemon {
-  const char* name;
+  const char* name;  ///< as sentences begin with it
   const char* socket;
   int unreachable;  ///< what the library throws when it cannot reach it
 };

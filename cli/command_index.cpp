@@ -35,7 +35,8 @@ using SteadyClock = std::chrono::steady_clock;
 
 /// How long between two looks at the daemon's status.
 constexpr int kPollMs = 100;
-/// An error, or waiting for something else, that lasts so long is told; the daemon itself goes on trying.
+/// After this long in an error, or waiting for something else, the command gives up and says why; the daemon itself
+/// goes on trying.
 constexpr std::chrono::seconds kErrorPatience(5);
 constexpr std::chrono::seconds kWaitPatience(30);
 

@@ -52,7 +52,7 @@ int CompareHomes(const std::function<void()>& tell, const std::function<int(KLIB
   return kDone;
 }
 
-/// A user's folder has its new name when the user's rename is told.
+/// The platform renames the user's folder first: without it under its new name, there is nothing that could follow.
 void RequireRenamed(const std::string& old_name, const std::string& new_name) {
   const std::string homes = sdk::SDKShare(kHomes).GetPath() + "/";
   RequireIndexed(kHomes, FolderMgr());

@@ -26,8 +26,10 @@ namespace {
 
 namespace field = fileindex::elastic;
 
+/// Hits that one call shows: what fits on a screen, and the most that may be asked for.
 constexpr long long kLimitDefault = 10;
 constexpr long long kLimitMax = 1000;
+/// How long --fresh waits unless it says otherwise, and at most.
 constexpr long long kFreshSeconds = 30;
 constexpr long long kFreshSecondsMax = 600;
 /// What the engine puts around a match. Not shown: each becomes what the output can show.
@@ -190,6 +192,7 @@ Json::Value SearchIn(const Arguments& arguments, Scope& scope) {
     return nothing;
   }
   Json::Value result = Ask(SearchRequest(arguments, scope));
+  // Shares that --fresh has left out before are not among those that the engine was asked about.
   const size_t before = scope.left_out.Unsearched();
   scope.left_out.AddFrom(result["left_out"]);
   scope.searched = scope.shares.empty() || scope.left_out.Unsearched() - before < scope.shares.size();

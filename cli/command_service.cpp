@@ -30,8 +30,8 @@ struct Service {
   int option;
 };
 
-/// In the order in which they start; the index daemon needs the engine and those who read files, and is told of
-/// changes.
+/// In the order in which they start: the index daemon needs the engine and content extraction, and reads the queues
+/// that the notification daemon fills.
 constexpr Service kServices[] = {
     {"kovaelasticd", "search engine", &KLIBServiceStart, &KLIBServiceStop, 1},
     {"kovacontentextractd", "content extraction", &KLIBServiceStart, &KLIBServiceStop, 1},
@@ -107,7 +107,7 @@ int RunDown(const Arguments&) {
   return kDone;
 }
 
-/// Goes by the list of indexed folders, and never fails for a service: what runs then is told.
+/// Goes by the list of indexed folders, and never fails for a service: what runs then is printed.
 int RunPrepare(const Arguments&) {
   services::GuardLockFiles();
   fileindex::PrepareServices();

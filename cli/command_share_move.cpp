@@ -149,6 +149,7 @@ void Follow(const Move& move, void (*move_index)(const Move& move), const std::s
     (void)KOVA::KOVANOTIFYD::MonitorQueue::Delete(old_queue, fileindex::kAppName,
                                                   KOVA::KOVANOTIFYD::MONITOR_QUEUE_TYPE_APPLICATION);
     move_index(move);
+    // A share that was paused stays so; its index has moved, and the event waits in its queue.
     if (!paused) GoOn(move);
     fileindex::RemoveQueueFiles(old_queue);
   } catch (const Error& error) {

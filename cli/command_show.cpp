@@ -28,10 +28,12 @@ namespace {
 
 using namespace fileindex::elastic;  // the fields' names
 
+/// Of a text's beginning; --text shows all of it.
 constexpr size_t kTextShownBytes = 300;
+/// Documents that one request asks for.
 constexpr unsigned kPageEntries = 10000;
 
-/// What the path says already, or what is shown in words of its own.
+/// Fields that are no lines of their own: the path says the same, or another line shows them.
 constexpr const char* kShownElsewhere[] = {kKOVAMDPath,        kKOVAMDParent,         kKOVAMDFSName,
                                            kKOVAMDKind,        kKOVAMDSearchFileName, kKOVAMDDisplayName,
                                            kKOVAMDIsDir,       kKOVAMDExtension,      kKOVAMDContentType,
@@ -88,6 +90,7 @@ void PrintText(const Json::Value& document, const std::string& text) {
                         (encoding.empty() ? "" : ", was " + EscapeOneLine(encoding)) +
                         (document[k_KOVATextCut].isBool() ? ", the beginning of more" : ""));
   size_t end = std::min(text.size(), kTextShownBytes);
+  // Back to the first byte of the character that the limit falls into.
   while (end < text.size() && (static_cast<unsigned char>(text[end]) & 0xC0) == 0x80) --end;
   (void)printf("        %s%s\n", EscapeOneLine(text.substr(0, end)).c_str(), end < text.size() ? " ..." : "");
 }

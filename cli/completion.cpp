@@ -105,8 +105,8 @@ Words JoinedOptionWords(const Command& command, const std::string& typed) {
 /// Of a command, the last of the words given behind its name.
 Words ArgumentWords(const Command& command, const Words& given) {
   const std::string& typed = given.back();
-  size_t place = 0;
-  const Option* pending = nullptr;
+  size_t place = 0;                 // how many words of the usage line are given already
+  const Option* pending = nullptr;  // the option whose value comes next
   for (size_t i = 0; i + 1 < given.size(); ++i) {
     const Option* known = pending;
     pending = nullptr;
@@ -123,6 +123,7 @@ Words ArgumentWords(const Command& command, const Words& given) {
     for (const Option& option : command.options) found.emplace_back(option.name);
     return found;
   }
+  // The last name of the usage line stands for all further words where it may be repeated: "PATH...".
   const Words names = Split(command.words, ' ');
   if (place >= names.size()) {
     const bool repeated = names.back().find("...") != std::string::npos;

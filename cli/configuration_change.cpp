@@ -54,6 +54,7 @@ int ChangeAndReport(const std::function<void()>& change, const std::string& noth
     const std::string path = EscapeForTerminal(folder->GetPath());
     std::shared_ptr<fileindex::Folder> now;
     if (after.HasFolder(folder->GetPath())) after.Get(now, folder->GetPath());
+    // No operation that is reported in this way adds a folder, so that the list of before has them all.
     if (now != nullptr && now->IsPaused() == folder->IsPaused()) continue;
     changed = true;
     (void)printf("%s: %s\n", path.c_str(), now == nullptr ? "forgotten" : now->IsPaused() ? "paused" : "goes on");

@@ -10,6 +10,8 @@ namespace ferrox::cli {
 
 namespace {
 
+/// How a byte is shown that is not: with a backslash, which names may contain, too. People see that something odd is
+/// there; scripts take the JSON form.
 constexpr char kShownByte[] = "\\x%02X";
 
 /// "\u001b". Code points of more than 16 bits are not escaped; there are no control characters among them.

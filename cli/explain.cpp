@@ -133,6 +133,7 @@ std::string WhyNotIndexableAt(const std::string& full_path, const sdk::SDKShare&
   if (lstat(full_path.c_str(), &status) != 0) {
     return errno == ENOENT ? "there is no such folder; make it first" : full_path + ": " + strerror(errno);
   }
+  // Paths are indexed in one form only, so that a file has one document.
   const std::string real = RealPath(full_path);
   if (real != full_path) {
     return (S_ISLNK(status.st_mode) ? "it is a link to " : "it is, without links and \"..\", ") + real +

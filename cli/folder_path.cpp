@@ -109,6 +109,7 @@ std::string ToSharePath(const std::string& text, const fileindex::FolderMgr& con
   const std::string in_share = FullPathInShare(cleaned);
   if (in_share.empty()) return OnDisk(text);
   const std::string as_disk_path = SharePathOnDisk(cleaned);
+  // "/photo/a" is a share path and may be a path on disk: where only the latter exists, that is meant.
   return !as_disk_path.empty() && !Exists(in_share) && Exists(cleaned) ? as_disk_path : cleaned;
 }
 

@@ -51,6 +51,7 @@ void LeftOut::Add(const std::string& share, int code, const std::string& reason,
   entry["code"] = code;
   entry["reason"] = reason;
   entry["searched"] = searched;
+  // The later reason is the one that counts: what was searched nevertheless may fail after all.
   for (Json::Value& earlier : list_) {
     if (earlier["share"] == share) return earlier.swap(entry);
   }

@@ -63,6 +63,7 @@ void PrepareInstance(Needs needs) {
     const std::string path = ferrox::InstancePath(folder);
     if (!ferrox::services::MakeFolders(path)) ThrowSystemFailure(errno, "make", path);
   }
+  // A lock file that other users could hold would let them stop every change of this instance.
   ferrox::services::GuardLockFiles();
 }
 

@@ -13,7 +13,9 @@ namespace ferrox::cli {
 
 namespace {
 
+/// Between two lines in a log.
 constexpr std::chrono::seconds kLineInterval(2);
+/// In characters, without the brackets.
 constexpr size_t kBarWidth = 24;
 
 /// Asked each time, since windows change. 80 where the terminal does not say.
@@ -40,6 +42,7 @@ std::string Progress::Text(const Json::Value& share, size_t bar_width) {
   const double seconds = static_cast<double>(UintOf(comparison, "elapsed_ms")) / 1000;
   const double rate = seconds > 0 ? static_cast<double>(examined) / seconds : 0;
   const std::string speed = Count(static_cast<uint64_t>(rate)) + " a second";
+  // Files that come while the comparison goes on are examined, but were not counted.
   const uint64_t total = std::max(UintOf(comparison, "estimate"), examined);
   if (!comparison["estimate_complete"].asBool() || total == 0) return Count(examined) + " files, " + speed;
 

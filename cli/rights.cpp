@@ -37,24 +37,29 @@ std::string UserName(uid_t uid) {
   return problem == 0 && user != nullptr ? user->pw_name : std::to_string(uid);
 }
 
-/// Of the path, or of the deepest folder above it that can be told.
-uid_t OwnerOf(std::string path) {
-  struct stat status = {};
-  while (stat(path.c_str(), &status) != 0 && path.size() > 1) {
+/// The path, or the deepest folder above it for which the predicate holds; "/" at the latest.
+template <typename Predicate>
+std::string FirstUpwards(std::string path, const Predicate& holds) {
+  while (!holds(path) && path.size() > 1) {
     path = Dirname(path);
     if (path.empty()) path = "/";
   }
+  return path;
+}
+
+/// Of the path, or of the deepest folder above it that the caller can see: what lies behind a folder that may not be
+/// entered belongs, as far as is known, to that folder's owner.
+uid_t OwnerOf(const std::string& path) {
+  struct stat status = {};
+  (void)FirstUpwards(path, [&status](const std::string& place) { return stat(place.c_str(), &status) == 0; });
   return status.st_uid;
 }
 
 /// The folder itself, or the deepest one above it that is there: where it would be made.
-std::string PlaceOf(std::string folder) {
+std::string PlaceOf(const std::string& folder) {
   struct stat status = {};
-  while (folder.size() > 1 && stat(folder.c_str(), &status) != 0 && errno == ENOENT) {
-    folder = Dirname(folder);
-    if (folder.empty()) folder = "/";
-  }
-  return folder;
+  return FirstUpwards(
+      folder, [&status](const std::string& place) { return stat(place.c_str(), &status) == 0 || errno != ENOENT; });
 }
 
 }  // namespace

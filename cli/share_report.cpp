@@ -29,6 +29,7 @@ void PrintReasons(const char* title, const Json::Value& counts, const Json::Valu
 void PrintExtractErrors(const Json::Value& counts, const Json::Value& examples) {
   const std::string prefix = kPartlyRead;
   Json::Value failed(Json::objectValue), partly(Json::objectValue), partly_examples(Json::objectValue);
+  // One table from the engine holds both: the beginning of a stored reason says which it is (kPartlyRead).
   for (const std::string& reason : counts.getMemberNames()) {
     if (!StringStartWith(reason, prefix)) {
       failed[reason] = counts[reason];

@@ -46,6 +46,7 @@ void AddWatches(const Json::Value& notification_daemon, Json::Value& index_daemo
   if (!index_daemon.isObject()) return;
   for (Json::Value& share : index_daemon["shares"]) {
     share["watch"] = WatchOf(notification_daemon, TextOf(share, "queue"));
+    // A change that the notification daemon holds is in no queue, so that the index daemon does not know of it.
     const int64_t held_since = IntOf(share["watch"], "held_since");
     const int64_t oldest = IntOf(share, "oldest_change");
     if (held_since != 0 && (oldest == 0 || held_since < oldest)) share["oldest_change"] = Json::Int64(held_since);

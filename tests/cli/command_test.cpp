@@ -5,6 +5,7 @@
 #include "cli/explain.h"
 #include "cli/format.h"
 #include "cli/progress.h"
+#include "common/subject_error.h"
 
 namespace ferrox::cli {
 namespace {
@@ -38,6 +39,17 @@ TEST(ExplainTest, SentenceNamesThingRemedyAndCode) {
             Explain(Error(Error::kNoSuchShare, "x")));
   EXPECT_EQ("that did not work (error 1499)", Explain(Error(static_cast<Error::ErrorCode>(1499))));
   EXPECT_EQ("no; because (error 120)", Explain(Error(Error::kBadArgument, "no"), "because"));
+  // What a failure is about decides, whatever its reason says.
+  const auto about = [](Error::ErrorCode code, Subject::Kind kind) {
+    return Explain(SubjectError(code, "r", {kind, "n"}));
+  };
+  EXPECT_EQ("the search engine: n (error 1400)", about(Error::kEngineBusy, Subject::kEngineRefusal));
+  EXPECT_EQ("cannot write n; see that its folder can be written and has space (error 505)",
+            about(Error::kSaveFailed, Subject::kFile));
+  EXPECT_EQ("r; the index daemon does not answer; 'fileindexctl up' starts it (error 502)",
+            about(Error::kInternal, Subject::kDaemonChannel));
+  EXPECT_EQ("no queue can be had for the folder n; the system log says more (error 502)",
+            about(Error::kInternal, Subject::kQueuePlace));
 }
 
 TEST(ProgressTest, TextGrowsWithWhatIsKnown) {
