@@ -1,13 +1,15 @@
 #pragma once
 
+#include <string>
 #include <string_view>
 
-/// Questions about paths as texts: nothing here looks at a file system. Paths are absolute and in their plain form: no
-/// "." or "..", no "/" at the end except that of "/" itself.
+/// Paths as texts: nothing here looks at a file system. Paths are in their plain form: no "." or "..", no "/" at the
+/// end except that of "/" itself.
 namespace base {
 
-/// Whether `path` is `folder` or lies below it, by whole names: "/v/ab" does not lie below "/v/a". All paths lie below
-/// "/", and below the empty path, by which a folder is meant whose name is "" before the first "/".
+/// Whether `path` is `folder` or lies below it, by whole names: "/v/ab" does not lie below "/v/a". All absolute paths
+/// lie below "/", and below the empty path, which is how "/" looks where names are put behind it with a "/" before
+/// each.
 inline bool IsAtOrBelow(std::string_view path, std::string_view folder) {
   if (!path.starts_with(folder)) return false;
   return path.size() == folder.size() || path[folder.size()] == '/' || folder == "/";
@@ -17,5 +19,15 @@ inline bool IsAtOrBelow(std::string_view path, std::string_view folder) {
 inline bool IsBelow(std::string_view path, std::string_view folder) {
   return path.size() > folder.size() && IsAtOrBelow(path, folder);
 }
+
+/// The folder that holds `path`: "/" for what lies in "/" (and for "/" itself), "." for a name without a folder.
+inline std::string FolderOf(std::string_view path) {
+  const size_t slash = path.rfind('/');
+  if (slash == std::string_view::npos) return ".";
+  return std::string(path.substr(0, slash == 0 ? 1 : slash));
+}
+
+/// What stands behind the last "/", the whole path when there is none.
+inline std::string NameOf(std::string_view path) { return std::string(path.substr(path.rfind('/') + 1)); }
 
 }  // namespace base

@@ -2,8 +2,7 @@
 
 #include <cstdio>
 
-#include <kova/text.h>
-
+#include "base/text.h"
 #include "common/json_util.h"
 
 namespace ferrox::cli {
@@ -23,14 +22,14 @@ std::string JsonEscape(int code_point) {
 
 }  // namespace
 
-std::string EscapeForTerminal(std::string_view text) { return kova::WithoutControls(text, kShownByte); }
+std::string EscapeForTerminal(std::string_view text) { return base::WithoutControls(text, kShownByte); }
 
 std::string EscapeText(std::string_view text) {
   std::string lines;
   for (size_t i = 0; i < text.size(); ++i) {
     if (text.compare(i, 2, "\r\n") != 0) lines += text[i];
   }
-  return kova::WithoutControls(lines, kShownByte, "\n\t");
+  return base::WithoutControls(lines, kShownByte, "\n\t");
 }
 
 std::string EscapeOneLine(std::string_view text) {
@@ -55,10 +54,10 @@ std::string ToScriptJson(const Json::Value& value) {
   std::string json;
   json.reserve(text.size());
   while (!text.empty()) {
-    const size_t length = kova::CharacterBytes(text);
+    const size_t length = base::CharacterBytes(text);
     const std::string_view taken = text.substr(0, length == 0 ? 1 : length);
     const int control =
-        length == 0 ? kLoneSurrogate + static_cast<unsigned char>(text[0]) : kova::ControlCodePoint(taken);
+        length == 0 ? kLoneSurrogate + static_cast<unsigned char>(text[0]) : base::ControlCodePoint(taken);
     json += control < 0 ? std::string(taken) : JsonEscape(control);
     text.remove_prefix(taken.size());
   }

@@ -2,6 +2,7 @@
 #include <clocale>
 #include <cstdio>
 
+#include "base/files.h"
 #include "cli/command_table.h"
 #include "cli/completion.h"
 #include "cli/escape.h"
@@ -61,7 +62,7 @@ void PrepareInstance(Needs needs) {
   if (needs < Needs::kInstance || ferrox::InstancePath("").empty()) return;
   for (const char* folder : {"/tmp", "/var/run", ferrox::kConfigurationFolder}) {
     const std::string path = ferrox::InstancePath(folder);
-    if (!ferrox::services::MakeFolders(path)) ThrowSystemFailure(errno, "make", path);
+    if (!base::MakeFolders(path)) ThrowSystemFailure(errno, "make", path);
   }
   // A lock file that other users could hold would let them stop every change of this instance.
   ferrox::services::GuardLockFiles();

@@ -13,7 +13,7 @@ install(EXPORT fileindexTargets NAMESPACE fileindex:: DESTINATION ${package_fold
 # those that have no source; the others are its own business.
 install(DIRECTORY ${CMAKE_SOURCE_DIR}/common ${CMAKE_SOURCE_DIR}/sdk DESTINATION ${header_folder}
         FILES_MATCHING PATTERN "*.h")
-foreach(header base/mutex base/path base/path_table base/scope_exit base/thread_annotations base/unique_fd
+foreach(header base/mutex base/path base/path_table base/scope_exit base/text base/thread_annotations base/unique_fd
         fileindex/folder fileindex/folder_mgr fileindex/index_mgr fileindex/optree fileindex/queue_mgr fileindex/status_mgr fileindex/util
         fileindex/watch_list fileindex/folders/folder fileindex/folders/folder_mgr fileindex/operations/index_mgr
         fileindex/operations/operation_error

@@ -9,10 +9,12 @@
 #include <algorithm>
 #include <cerrno>
 #include <memory>
+#include <utility>
 
 #include <kova/fs.h>
 #include <kova/user.h>
 
+#include "base/files.h"
 #include "base/unique_fd.h"
 #include "common/log.h"
 #include "common/mutex.h"
@@ -25,30 +27,6 @@ namespace {
 constexpr size_t kPathBufferBytes = 4096;
 constexpr int kLinkHopsMax = 40;  // as the kernel's own limit: links may point at each other
 constexpr char kPackageUser[] = "Ferrox";
-
-bool WriteAll(int fd, std::string_view content) {
-  while (!content.empty()) {
-    const ssize_t written = write(fd, content.data(), content.size());
-    if (written < 0 && errno == EINTR) continue;
-    if (written < 0) return false;
-    content.remove_prefix(static_cast<size_t>(written));
-  }
-  return true;
-}
-
-bool SyncFolderOf(const std::string& path) {
-  const size_t slash = path.rfind('/');
-  return SyncFolder(slash == std::string::npos ? "." : path.substr(0, slash + 1));
-}
-
-/// Writes `content` to the file at `path`, which is to replace `old` (null: there is none), and makes it durable.
-bool WriteNewFile(const std::string& path, std::string_view content, const struct stat* old) {
-  const base::UniqueFd file(open(path.c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC | O_NOFOLLOW, 0600));
-  if (!file.Valid()) return false;
-  if (old != nullptr && fchown(file.Get(), old->st_uid, old->st_gid) != 0) errno = 0;  // not everybody may
-  const mode_t mode = old != nullptr ? (old->st_mode & 0777) : 0644;
-  return fchmod(file.Get(), mode) == 0 && WriteAll(file.Get(), content) && fsync(file.Get()) == 0;
-}
 
 }  // namespace
 
@@ -153,36 +131,15 @@ bool ChownFerrox(const std::string& path) {
 bool WriteWholeFile(const std::string& path, std::string_view content) {
   struct stat old = {};
   const bool exists = stat(path.c_str(), &old) == 0;
+  const base::FileAttributes attributes = {exists ? old.st_mode & 0777 : 0644, exists ? old.st_uid : geteuid(),
+                                           exists ? old.st_gid : getegid(), false};
   const std::string beside = path + ".new";
-  if (WriteNewFile(beside, content, exists ? &old : nullptr) && rename(beside.c_str(), path.c_str()) == 0)
-    return SyncFolderOf(path);
-  const int saved_errno = errno;
-  (void)unlink(beside.c_str());
-  errno = saved_errno;
-  return false;
+  base::UniqueFd file(open(beside.c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC | O_NOFOLLOW, 0600));
+  return base::ReplaceFile(path, content, attributes, std::move(file), beside);
 }
 
-bool SyncFolder(const std::string& folder) {
-  const base::UniqueFd opened(open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
-  return opened.Valid() && fsync(opened.Get()) == 0;
-}
+bool SyncFolder(const std::string& folder) { return base::SyncFolder(folder); }
 
-bool ReadWholeFile(const std::string& path, std::string& content) {
-  const base::UniqueFd file(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK));
-  struct stat status = {};
-  if (!file.Valid() || fstat(file.Get(), &status) != 0) return false;
-  if (!S_ISREG(status.st_mode)) {
-    errno = EINVAL;
-    return false;
-  }
-  content.clear();
-  char buffer[65536];
-  for (;;) {
-    const ssize_t got = read(file.Get(), buffer, sizeof(buffer));
-    if (got < 0 && errno == EINTR) continue;
-    if (got <= 0) return got == 0;
-    content.append(buffer, static_cast<size_t>(got));
-  }
-}
+bool ReadWholeFile(const std::string& path, std::string& content) { return base::ReadWholeFile(path, content); }
 
 }  // namespace ferrox

@@ -8,9 +8,9 @@
 #include <streambuf>
 #include <utility>
 
-#include <json/reader.h>
 #include <json/writer.h>
 
+#include "base/json.h"
 #include "common/file_util.h"
 #include "common/log.h"
 
@@ -55,16 +55,6 @@ Json::StreamWriterBuilder WriterBuilder(const char* indentation) {
   return builder;
 }
 
-std::unique_ptr<Json::CharReader> NewReader() {
-  Json::CharReaderBuilder builder;
-  builder["collectComments"] = false;
-  builder["allowComments"] = false;
-  builder["allowTrailingCommas"] = false;
-  builder["failIfExtra"] = true;
-  builder["stackLimit"] = 1000;
-  return std::unique_ptr<Json::CharReader>(builder.newCharReader());
-}
-
 [[noreturn]] void FailReading(const char* condition, int line, const std::string& reason, const Json::Value& object) {
   Fail({FERROX_SOURCE, line, "GetJsonValue", condition}, errno, Error::kBadArgument, reason + AppendData(object),
        {Subject::kJson, reason});
@@ -84,14 +74,7 @@ const Json::Value* FindMember(const Json::Value& object, const std::string& key,
 }  // namespace
 
 bool fromString(Json::Value& value, const std::string& text) {
-  thread_local const std::unique_ptr<Json::CharReader> reader = NewReader();
-  try {
-    if (reader->parse(text.data(), text.data() + text.size(), &value, nullptr)) return true;
-  } catch (const Json::Exception&) {
-    // Nesting beyond the limit: as unreadable as any other text.
-  }
-  value = Json::Value();
-  return false;
+  return base::ParseJson(text, base::JsonRules::kAnyValue, value);
 }
 
 /// A stream would take a text that memory was too short for as written, and a part of it would pass for the whole.
@@ -105,10 +88,7 @@ std::string toString(const Json::Value& value) {
 }
 
 bool fromFile(Json::Value& value, const std::string& path) {
-  std::string text;
-  if (ReadWholeFile(path, text)) return fromString(value, text);
-  value = Json::Value();
-  return false;
+  return base::ReadJsonFile(path, base::JsonRules::kAnyValue, value);
 }
 
 bool toFile(const Json::Value& value, const std::string& path) { return WriteWholeFile(path, toString(value) + "\n"); }

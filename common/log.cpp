@@ -4,13 +4,12 @@
 #include <unistd.h>
 
 #include <algorithm>
-#include <atomic>
 #include <cerrno>
 #include <cstdarg>
 #include <cstdio>
 #include <cstring>
 
-#include <kova/log.h>
+#include "base/log_sink.h"
 
 namespace ferrox {
 
@@ -18,9 +17,7 @@ namespace {
 
 constexpr size_t kLineMaxBytes = 8192;
 
-void SystemSink(int priority, const char* line) { syslog(priority, "%s", line); }
-
-std::atomic<LogSink> g_sink{&SystemSink};
+constinit base::LogSink g_sink;
 
 }  // namespace
 
@@ -32,11 +29,11 @@ void Log(int priority, const char* format, ...) {
   const int length = vsnprintf(line, sizeof(line), format, arguments);
   va_end(arguments);
   const size_t used = length < 0 ? 0 : std::min(static_cast<size_t>(length), sizeof(line) - 1);
-  g_sink.load()(priority, kova::WithoutControlCharacters({line, used}).c_str());
+  g_sink.Write(priority, {line, used});
   errno = saved_errno;
 }
 
-LogSink SetLogSink(LogSink sink) { return g_sink.exchange(sink != nullptr ? sink : &SystemSink); }
+LogSink SetLogSink(LogSink sink) { return g_sink.Set(sink); }
 
 std::string ModuleName(const char* file) {
   const char* slash = strrchr(file, '/');

@@ -19,8 +19,10 @@
 #include <kova/instance.h>
 #include <kova/lock_holder.h>
 
+#include "base/files.h"
+#include "base/path.h"
+#include "base/unique_fd.h"
 #include "platform/host/detached_process.h"
-#include "platform/host/files.h"
 #include "platform/host/log.h"
 #include "platform/host/service_log.h"
 #include "platform/shared/failure.h"
@@ -52,7 +54,7 @@ pid_t ReadPid(int fd) {
 /// The process that holds the service's pid file, or 0. The lock is only tried when the written process exists, so that
 /// looking does not get in the way of a daemon that is just taking it.
 pid_t RunningPid(const ServiceRow& service) {
-  const Fd file(open(PidPath(service).c_str(), O_RDONLY | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK));
+  const base::UniqueFd file(open(PidPath(service).c_str(), O_RDONLY | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK));
   if (!file.Valid() && errno == EACCES) {  // only its owner can open it
     const std::vector<LockHolder> holders = LockHolders(PidPath(service));
     return holders.empty() ? 0 : holders.front().pid;
@@ -65,7 +67,7 @@ pid_t RunningPid(const ServiceRow& service) {
 
 bool Answers(const ServiceRow& service) {
   if (service.socket == nullptr) return true;
-  const Fd connection(ConnectUnixSocket(InstanceRoot() + service.socket));
+  const base::UniqueFd connection(ConnectUnixSocket(InstanceRoot() + service.socket));
   return connection.Valid();
 }
 
@@ -76,9 +78,9 @@ std::string FindProgram(const std::string& program) {
   char self[4096];
   const ssize_t length = readlink("/proc/self/exe", self, sizeof(self));
   if (length > 0 && static_cast<size_t>(length) < sizeof(self)) {
-    folders[1] = FolderOf(std::string(self, static_cast<size_t>(length)));
-    folders[2] = FolderOf(folders[1]) + "/sbin";
-    folders[3] = FolderOf(folders[1]) + "/libexec";
+    folders[1] = base::FolderOf(std::string(self, static_cast<size_t>(length)));
+    folders[2] = base::FolderOf(folders[1]) + "/sbin";
+    folders[3] = base::FolderOf(folders[1]) + "/libexec";
   }
   for (const std::string& folder : folders) {
     const std::string path = folder + "/" + program;
@@ -133,7 +135,7 @@ class SwitchLock {
 
  private:
   std::string path_;
-  Fd file_;
+  base::UniqueFd file_;
 };
 
 int Ended(const ServiceRow& service, std::streamoff log_from) {
@@ -191,7 +193,7 @@ int StartLocked(const ServiceRow& service, const std::string& program) {
 
 /// What was stopped is not taken for dead, however it ended.
 void EmptyPidFile(const ServiceRow& service) {
-  const Fd file(open(PidPath(service).c_str(), O_WRONLY | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK));
+  const base::UniqueFd file(open(PidPath(service).c_str(), O_WRONLY | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK));
   if (file.Valid() && flock(file.Get(), LOCK_EX | LOCK_NB) == 0) (void)!ftruncate(file.Get(), 0);
 }
 
@@ -232,7 +234,7 @@ pid_t ChildServicePid(const ServiceRow& service) {
 }
 
 bool HasChildServiceDied(const ServiceRow& service) {
-  const Fd file(open(PidPath(service).c_str(), O_RDONLY | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK));
+  const base::UniqueFd file(open(PidPath(service).c_str(), O_RDONLY | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK));
   return file.Valid() && ReadPid(file.Get()) != 0 && ChildServicePid(service) == 0;
 }
 
@@ -245,7 +247,7 @@ int StartIf(const ServiceRow& service, bool (*wanted)(const ServiceRow&)) {
                                                       " is not installed beside this program; set FERROX_LIBEXEC to "
                                                       "the folder that holds it");
   }
-  (void)MakeFolders(InstanceRoot() + "/var/run", 0755);  // a failure shows as that of the lock
+  (void)base::MakeFoldersDurably(InstanceRoot() + "/var/run", 0755);  // a failure shows as that of the lock
   SwitchLock lock(service);
   if (Prepare(service, lock) < 0) return -1;
   return wanted(service) ? StartLocked(service, program) : 0;

@@ -12,7 +12,9 @@
 #include <cstring>
 #include <vector>
 
-#include "platform/host/files.h"
+#include "base/files.h"
+#include "base/path.h"
+#include "base/unique_fd.h"
 #include "platform/host/run_program.h"
 
 namespace kova::host {
@@ -91,19 +93,19 @@ pid_t ReadReports(int fd) {
 }
 
 int OpenLog(const std::string& path) {
-  if (!MakeFolders(FolderOf(path), 0755)) return -1;
+  if (!base::MakeFoldersDurably(base::FolderOf(path), 0755)) return -1;
   return open(path.c_str(), O_WRONLY | O_CREAT | O_APPEND | O_CLOEXEC | O_NOFOLLOW, 0640);
 }
 
 }  // namespace
 
 pid_t StartDetached(const std::string& program, const std::string& log_path) {
-  const Fd log_file(OpenLog(log_path));
-  const Fd null_file(open("/dev/null", O_RDONLY | O_CLOEXEC));
+  const base::UniqueFd log_file(OpenLog(log_path));
+  const base::UniqueFd null_file(open("/dev/null", O_RDONLY | O_CLOEXEC));
   int ends[2];
   if (!log_file.Valid() || !null_file.Valid() || pipe2(ends, O_CLOEXEC) != 0) return -1;
-  const Fd reading(ends[0]);
-  Fd writing(ends[1]);
+  const base::UniqueFd reading(ends[0]);
+  base::UniqueFd writing(ends[1]);
   const std::vector<std::string> arguments = {program};
   const std::vector<std::string> environment = Environment();
   const std::vector<char*> argv = ArgumentVector(arguments);

@@ -10,10 +10,10 @@
 
 #include <kova/fs.h>
 
-#include "platform/host/files.h"
+#include "base/files.h"
+#include "base/path.h"
+#include "base/unique_fd.h"
 #include "platform/shared/failure.h"
-
-using kova::host::Fd;
 
 namespace {
 
@@ -30,7 +30,7 @@ bool CopyByHand(int from, int to) {
     const ssize_t got = read(from, buffer.data(), buffer.size());
     if (got == 0) return true;
     if (got < 0 && errno == EINTR) continue;
-    if (got < 0 || !kova::host::WriteAll(to, buffer.data(), static_cast<size_t>(got))) return false;
+    if (got < 0 || !base::WriteAll(to, {buffer.data(), static_cast<size_t>(got)})) return false;
   }
 }
 
@@ -74,15 +74,15 @@ bool Publish(const std::string& temporary, const std::string& dst, bool overwrit
 }
 
 bool Copy(const std::string& src, const std::string& dst, bool overwrite) {
-  const Fd from(open(src.c_str(), O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC));
+  const base::UniqueFd from(open(src.c_str(), O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC));
   struct stat info = {};
   if (!from.Valid() || fstat(from.Get(), &info) != 0) return false;
   if (!S_ISREG(info.st_mode)) {
     errno = EINVAL;
     return false;
   }
-  std::string temporary = kova::host::FolderOf(dst) + "/.kova-copy.XXXXXX";
-  Fd to(mkostemp(temporary.data(), O_CLOEXEC));
+  std::string temporary = base::FolderOf(dst) + "/.kova-copy.XXXXXX";
+  base::UniqueFd to(mkostemp(temporary.data(), O_CLOEXEC));
   if (!to.Valid()) return false;
   const bool done = CopyContent(from.Get(), to.Get()) && CopyAttributes(to.Get(), info) && fsync(to.Get()) == 0 &&
                     to.Close() && Publish(temporary, dst, overwrite);
@@ -96,7 +96,7 @@ bool Copy(const std::string& src, const std::string& dst, bool overwrite) {
 bool Move(const std::string& src, const std::string& dst, bool overwrite) {
   if (Publish(src, dst, overwrite)) return true;
   // To another file system. What could not be taken away afterwards is not copied first.
-  return errno == EXDEV && faccessat(AT_FDCWD, kova::host::FolderOf(src).c_str(), W_OK, AT_EACCESS) == 0 &&
+  return errno == EXDEV && faccessat(AT_FDCWD, base::FolderOf(src).c_str(), W_OK, AT_EACCESS) == 0 &&
          Copy(src, dst, overwrite) && unlink(src.c_str()) == 0;
 }
 

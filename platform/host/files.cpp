@@ -11,30 +11,20 @@
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
-#include <memory>
 #include <sstream>
 #include <utility>
 
-#include <json/reader.h>
-
 #include <kova/lock_holder.h>
+
+#include "base/files.h"
+#include "base/json.h"
+#include "base/path.h"
 
 namespace kova::host {
 
 namespace {
 
 constexpr std::chrono::seconds kLockMax(10);
-
-bool ReadAll(int fd, std::string& text) {
-  char buffer[16384];
-  for (;;) {
-    const ssize_t got = read(fd, buffer, sizeof(buffer));
-    if (got == 0) return true;
-    if (got < 0 && errno == EINTR) continue;
-    if (got < 0 || text.size() > kFileMaxBytes) return false;
-    text.append(buffer, static_cast<size_t>(got));
-  }
-}
 
 /// The parser's messages stand in several lines; a sentence for the log has one.
 std::string OneLine(const std::string& text) {
@@ -48,32 +38,15 @@ std::string OneLine(const std::string& text) {
 }
 
 std::string Parse(const std::string& text, Json::Value& value) {
-  Json::CharReaderBuilder builder;
-  Json::CharReaderBuilder::strictMode(&builder.settings_);
-  builder["failIfExtra"] = true;
-  const std::unique_ptr<Json::CharReader> reader(builder.newCharReader());
-  std::string errors;
-  try {
-    if (reader->parse(text.data(), text.data() + text.size(), &value, &errors)) return {};
-  } catch (const std::exception& error) {
-    errors = error.what();
-  }
-  value = Json::Value();
-  return "is not JSON: " + OneLine(errors);
+  std::string problem;
+  if (base::ParseJson(text, base::JsonRules::kDocument, value, &problem)) return {};
+  return "is not JSON: " + OneLine(problem);
 }
 
 /// O_NONBLOCK: a FIFO at the path must not hold the opener.
 int OpenLockFile(const std::string& path) {
-  if (!MakeFolders(FolderOf(path), 0755) || !MakeLockFilePrivate(path)) return -1;
+  if (!base::MakeFoldersDurably(base::FolderOf(path), 0755) || !MakeLockFilePrivate(path)) return -1;
   return open(path.c_str(), O_RDWR | O_CREAT | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK, 0600);
-}
-
-/// Gives an open file the owner and the mode of `like`; chown takes bits of the mode away and goes first.
-bool Dress(int fd, const struct stat& like) {
-  struct stat now = {};
-  if (fstat(fd, &now) != 0) return false;
-  const bool owned = now.st_uid == like.st_uid && now.st_gid == like.st_gid;
-  return (owned || fchown(fd, like.st_uid, like.st_gid) == 0) && fchmod(fd, like.st_mode & 07777) == 0;
 }
 
 /// 0, or why the lock cannot be had: an error number.
@@ -88,27 +61,14 @@ int LockUntil(int fd, std::chrono::steady_clock::time_point deadline) {
   return 0;
 }
 
-bool SyncFolder(const std::string& path) {
-  const Fd folder(open(path.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
-  return folder.Valid() && fsync(folder.Get()) == 0;
-}
-
 }  // namespace
-
-Fd::~Fd() {
-  if (fd_ >= 0) (void)close(fd_);
-}
-
-bool Fd::Close() { return close(std::exchange(fd_, -1)) == 0; }
-
-int Fd::Release() { return std::exchange(fd_, -1); }
 
 ExclusiveLock::ExclusiveLock(const std::string& path) : path_(path) {
   const auto deadline = std::chrono::steady_clock::now() + kLockMax;
   do {  // it may just have been replaced
-    file_ = std::make_unique<Fd>(OpenLockFile(path));
-    problem_ = file_->Valid() ? LockUntil(file_->Get(), deadline) : errno;
-  } while (problem_ == 0 && !IsStillAt(file_->Get(), path));
+    file_.Reset(OpenLockFile(path));
+    problem_ = file_.Valid() ? LockUntil(file_.Get(), deadline) : errno;
+  } while (problem_ == 0 && !IsStillAt(file_.Get(), path));
 }
 
 std::string ExclusiveLock::ProblemText() const {
@@ -117,30 +77,15 @@ std::string ExclusiveLock::ProblemText() const {
          (holder.empty() ? std::string(strerror(problem_)) : holder + "; end it if it hangs, and try again");
 }
 
-std::string FolderOf(const std::string& path) {
-  const size_t slash = path.rfind('/');
-  if (slash == std::string::npos) return ".";
-  return slash == 0 ? "/" : path.substr(0, slash);
-}
-
-std::string NameOf(const std::string& path) { return path.substr(path.rfind('/') + 1); }
-
-bool MakeFolders(const std::string& path, mode_t mode) {
-  if (path.empty()) return true;
-  bool made = mkdir(path.c_str(), mode) == 0;
-  if (!made && errno == ENOENT) made = MakeFolders(FolderOf(path), mode) && mkdir(path.c_str(), mode) == 0;
-  return made ? SyncFolder(FolderOf(path)) : errno == EEXIST;
-}
-
 std::string ReadTextFile(const std::string& path, std::string& text, struct stat* info) {
   struct stat own = {};
   if (info == nullptr) info = &own;
   *info = {};
   text.clear();
-  const Fd file(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK));
+  const base::UniqueFd file(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK));
   if (!file.Valid()) return errno == ENOENT ? std::string() : std::string("cannot be read: ") + strerror(errno);
   if (fstat(file.Get(), info) != 0 || !S_ISREG(info->st_mode)) return "is not a regular file";
-  return ReadAll(file.Get(), text) ? std::string() : "cannot be read whole";
+  return base::ReadAll(file.Get(), text, kFileMaxBytes) ? std::string() : "cannot be read whole";
 }
 
 std::string ReadJsonFile(const std::string& path, Json::Value& value) {
@@ -149,17 +94,6 @@ std::string ReadJsonFile(const std::string& path, Json::Value& value) {
   struct stat info = {};
   const std::string problem = ReadTextFile(path, text, &info);
   return !problem.empty() || info.st_ino == 0 ? problem : Parse(text, value);
-}
-
-bool WriteAll(int fd, const char* data, size_t size) {
-  while (size > 0) {
-    const ssize_t written = write(fd, data, size);
-    if (written < 0 && errno == EINTR) continue;
-    if (written <= 0) return false;
-    data += written;
-    size -= static_cast<size_t>(written);
-  }
-  return true;
 }
 
 bool ReplaceFile(const std::string& path, const std::string& content, mode_t mode) {
@@ -172,17 +106,12 @@ bool ReplaceFile(const std::string& path, const std::string& content, mode_t mod
 
 bool ReplaceFile(const std::string& path, const std::string& content, const struct stat& like) {
   std::string temporary = path + ".XXXXXX";
-  Fd file(mkostemp(temporary.data(), O_CLOEXEC));
+  base::UniqueFd file(mkostemp(temporary.data(), O_CLOEXEC));
   if (!file.Valid()) return false;
-  const bool replaced = WriteAll(file.Get(), content.data(), content.size()) && Dress(file.Get(), like) &&
-                        fsync(file.Get()) == 0 && file.Close() && rename(temporary.c_str(), path.c_str()) == 0;
-  if (replaced) return SyncFolder(FolderOf(path));
-  const int saved_errno = errno;
-  (void)unlink(temporary.c_str());
-  errno = saved_errno;
-  return false;
+  const base::FileAttributes attributes = {like.st_mode & 07777, like.st_uid, like.st_gid, true};
+  return base::ReplaceFile(path, content, attributes, std::move(file), temporary);
 }
 
-bool RemoveFile(const std::string& path) { return unlink(path.c_str()) == 0 && SyncFolder(FolderOf(path)); }
+bool RemoveFile(const std::string& path) { return unlink(path.c_str()) == 0 && base::SyncFolder(base::FolderOf(path)); }
 
 }  // namespace kova::host

@@ -3,30 +3,13 @@
 #include <sys/stat.h>
 #include <sys/types.h>
 
-#include <memory>
 #include <string>
 
 #include <json/value.h>
 
+#include "base/unique_fd.h"
+
 namespace kova::host {
-
-/// Closes a descriptor at the end of a scope.
-class Fd {
- public:
-  explicit Fd(int fd) : fd_(fd) {}
-  Fd(const Fd&) = delete;
-  Fd& operator=(const Fd&) = delete;
-  ~Fd();
-  int Get() const { return fd_; }
-  bool Valid() const { return fd_ >= 0; }
-  /// Closes now; false when that fails, as it may when written data cannot be stored.
-  bool Close();
-  /// Gives the descriptor away.
-  int Release();
-
- private:
-  int fd_;
-};
 
 /// Holds an exclusive lock on a file, made when missing as are the folders above it, for the time of a scope; others
 /// cannot open it. Waits while another process or thread holds it, at most 10 s. Links are not followed, programs that
@@ -41,16 +24,9 @@ class ExclusiveLock {
 
  private:
   std::string path_;
-  std::unique_ptr<Fd> file_;
+  base::UniqueFd file_;
   int problem_ = 0;
 };
-
-/// The part before the last "/" ("/" for a path directly below the root) and the part after it.
-std::string FolderOf(const std::string& path);
-std::string NameOf(const std::string& path);
-
-/// Makes a folder and those above it, each durably; true when it exists afterwards.
-bool MakeFolders(const std::string& path, mode_t mode);
 
 /// The largest file that is read whole.
 constexpr size_t kFileMaxBytes = 16 << 20;
@@ -63,14 +39,13 @@ std::string ReadTextFile(const std::string& path, std::string& text, struct stat
 /// The same for a JSON file. A missing file is an empty value.
 std::string ReadJsonFile(const std::string& path, Json::Value& value);
 
-/// Replaces a file whole: written beside it, synced, renamed over it, the folder synced. False, with errno, on failure.
+/// base::ReplaceFile by a file of a name of its own, so that several processes may replace one path. False, with errno,
+/// on failure, which it also is when the owner cannot be had.
 bool ReplaceFile(const std::string& path, const std::string& content, mode_t mode);
 /// The same, with the mode and the owner of `like`.
 bool ReplaceFile(const std::string& path, const std::string& content, const struct stat& like);
 
 /// Removes a file durably. False, with errno, on failure.
 bool RemoveFile(const std::string& path);
-
-bool WriteAll(int fd, const char* data, size_t size);
 
 }  // namespace kova::host

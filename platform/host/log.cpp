@@ -1,23 +1,19 @@
 #include "platform/host/log.h"
 
-#include <syslog.h>
-
-#include <atomic>
-#include <cerrno>
 #include <map>
-#include <mutex>
 
-#include <kova/log.h>
+#include "base/log_sink.h"
+#include "base/mutex.h"
 
 namespace kova::host {
 
 namespace {
 
-std::atomic<LogSink> g_sink{nullptr};
+constinit base::LogSink g_sink;
 
 struct Said {
-  std::mutex mutex;
-  std::map<std::string, std::string> lines;  // by subject
+  base::Mutex mutex;
+  std::map<std::string, std::string> lines BASE_GUARDED_BY(mutex);  // by subject
 };
 
 Said& WhatWasSaid() {
@@ -27,21 +23,11 @@ Said& WhatWasSaid() {
 
 }  // namespace
 
-void LogLine(int priority, const std::string& line) {
-  const int saved_errno = errno;
-  const std::string plain = WithoutControlCharacters(line);
-  const LogSink sink = g_sink;
-  if (sink != nullptr) {
-    sink(priority, plain.c_str());
-  } else {
-    syslog(priority, "%s", plain.c_str());
-  }
-  errno = saved_errno;
-}
+void LogLine(int priority, const std::string& line) { g_sink.Write(priority, line); }
 
 void LogChange(int priority, const std::string& subject, const std::string& line) {
   Said& said = WhatWasSaid();
-  const std::lock_guard<std::mutex> guard(said.mutex);
+  const base::MutexLock lock(said.mutex);
   std::string& last = said.lines[subject];
   if (last == line) return;
   last = line;
@@ -50,9 +36,9 @@ void LogChange(int priority, const std::string& subject, const std::string& line
 
 void SetLogSink(LogSink sink) {
   Said& said = WhatWasSaid();
-  const std::lock_guard<std::mutex> guard(said.mutex);
+  const base::MutexLock lock(said.mutex);
   said.lines.clear();
-  g_sink = sink;
+  (void)g_sink.Set(sink);
 }
 
 }  // namespace kova::host

@@ -13,7 +13,6 @@
 #include <kova/mountinfo.h>
 
 #include "base/path.h"
-#include "platform/host/files.h"
 
 namespace kova::host {
 
@@ -74,12 +73,12 @@ int IsMountRoot(const std::string& path) {
   }
   // An older kernel: another device than the folder above. It misses bind mounts within a file system.
   struct stat self = {}, above = {};
-  if (lstat(path.c_str(), &self) != 0 || lstat(FolderOf(path).c_str(), &above) != 0) return -1;
+  if (lstat(path.c_str(), &self) != 0 || lstat(base::FolderOf(path).c_str(), &above) != 0) return -1;
   return self.st_dev != above.st_dev || self.st_ino == above.st_ino ? 1 : 0;
 }
 
 std::string MountPointOf(std::string path) {
-  while (path.size() > 1 && IsMountRoot(path) != 1) path = FolderOf(path);
+  while (path.size() > 1 && IsMountRoot(path) != 1) path = base::FolderOf(path);
   return path;
 }
 

@@ -16,6 +16,7 @@
 #include <kova/instance.h>
 #include <kova/notifyd.h>
 
+#include "base/files.h"
 #include "platform/host/files.h"
 #include "platform/host/log.h"
 #include "platform/shared/failure.h"
@@ -178,7 +179,7 @@ bool MonitorQueue::Upsert(const MonitorQueue& queue, const std::string& applicat
   std::string present;
   if (ReadTextFile(key.File(), present).empty() && present == text) return true;
   return ChangeFile(key, [&](const std::string& path, bool) {
-    return MakeFolders(RegistryFolder(), 0755) && ReplaceFile(path, text, 0644);
+    return base::MakeFoldersDurably(RegistryFolder(), 0755) && ReplaceFile(path, text, 0644);
   });
 }
 

@@ -11,17 +11,16 @@
 #include <kova/instance.h>
 #include <kova/share.h>
 
-#include "platform/host/files.h"
+#include "base/path.h"
+#include "base/unique_fd.h"
 #include "platform/shared/failure.h"
-
-using kova::host::Fd;
 
 namespace {
 
 /// The first folder on the way up from `path` that exists.
 std::string Existing(std::string path) {
   struct stat info = {};
-  while (path != "/" && stat(path.c_str(), &info) != 0) path = kova::host::FolderOf(path);
+  while (path != "/" && stat(path.c_str(), &info) != 0) path = base::FolderOf(path);
   return path;
 }
 
@@ -41,7 +40,7 @@ bool FitsOnVolume(const std::string& path, int64_t bytes) {
 /// Asks the quota of the file system that holds `path`; true also where there is none, or it may not be asked.
 bool FitsInQuota(uint32_t uid, const std::string& path, int64_t bytes) {
 #ifdef SYS_quotactl_fd
-  const Fd folder(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK));
+  const base::UniqueFd folder(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK));
   struct dqblk quota = {};
   if (!folder.Valid() || syscall(SYS_quotactl_fd, folder.Get(), QCMD(Q_GETQUOTA, USRQUOTA), uid, &quota) != 0) {
     return true;

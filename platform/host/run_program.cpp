@@ -13,6 +13,7 @@
 
 #include <kova/service.h>
 
+#include "base/unique_fd.h"
 #include "platform/host/files.h"
 #include "platform/shared/arguments.h"
 #include "platform/shared/failure.h"
@@ -124,10 +125,10 @@ int RunForOutput(const std::string& path, const std::vector<std::string>& argume
   output.clear();
   int ends[2] = {-1, -1};
   if (pipe2(ends, O_CLOEXEC) != 0) return KOVA_FAIL_ERRNO();
-  const Fd read_end(ends[0]);
+  const base::UniqueFd read_end(ends[0]);
   pid_t pid = -1;
   {
-    const Fd write_end(ends[1]);
+    const base::UniqueFd write_end(ends[1]);
     const OutputActions actions(write_end.Get());
     pid = Spawn(path, arguments, actions.Get());
   }

@@ -5,9 +5,10 @@
 
 #include <algorithm>
 #include <chrono>
-#include <mutex>
 #include <sstream>
 
+#include "base/mutex.h"
+#include "base/path.h"
 #include "platform/host/configuration.h"
 #include "platform/host/files.h"
 #include "platform/host/log.h"
@@ -60,7 +61,7 @@ bool TakeSection(const SmbConf& conf, const std::string& section, ShareEntry& sh
   if (conf.IsOn(section, "printable") || SmbConf::Boolean(value("available")) == false) return false;
   share.path = PlainPath(value("path"));
   // Upper and lower case do not count in Samba's names; here a share is called as its folder.
-  const std::string folder = NameOf(share.path);
+  const std::string folder = base::NameOf(share.path);
   share.name = SmbConf::Fold(folder) == SmbConf::Fold(section) ? folder : section;
   if (share.path.find('%') != std::string::npos) {
     problem = "its path " + share.path + " differs from user to user";
@@ -95,7 +96,7 @@ SeenFile Look(const std::string& path) {
 class Source {
  public:
   std::shared_ptr<const std::vector<ShareEntry>> Get() {
-    const std::lock_guard<std::mutex> guard(mutex_);
+    const base::MutexLock lock(mutex_);
     const auto now = SteadyClock::now();
     if (now < look_at_) return answer_;
     look_at_ = now + kLookEvery;
@@ -112,18 +113,18 @@ class Source {
   }
 
   void LookSoon() {
-    const std::lock_guard<std::mutex> guard(mutex_);
+    const base::MutexLock lock(mutex_);
     look_at_ = {};
   }
 
  private:
-  bool HasChanged() const {
+  bool HasChanged() const BASE_REQUIRES(mutex_) {
     return std::any_of(files_.begin(), files_.end(),
                        [](const SeenFile& file) { return !SameFile(Look(file.path).info, file.info); });
   }
 
   /// The files are looked at first: what changes while testparm runs is seen the next time.
-  void Ask(const Configuration::Samba& samba) {
+  void Ask(const Configuration::Samba& samba) BASE_REQUIRES(mutex_) {
     files_ = {Look(samba.config)};
     std::string text, output;
     (void)ReadTextFile(samba.config, text);
@@ -142,12 +143,13 @@ class Source {
     LogChange(LOG_INFO, samba.testparm, "Samba has " + std::to_string(answer_->size()) + " shares to be indexed");
   }
 
-  std::mutex mutex_;
-  std::shared_ptr<const Configuration> configuration_;
-  std::shared_ptr<const std::vector<ShareEntry>> answer_;
-  std::vector<SeenFile> files_;
-  SteadyClock::time_point look_at_, retry_at_;
-  bool failed_ = false;
+  base::Mutex mutex_;
+  std::shared_ptr<const Configuration> configuration_ BASE_GUARDED_BY(mutex_);
+  std::shared_ptr<const std::vector<ShareEntry>> answer_ BASE_GUARDED_BY(mutex_);
+  std::vector<SeenFile> files_ BASE_GUARDED_BY(mutex_);
+  SteadyClock::time_point look_at_ BASE_GUARDED_BY(mutex_);
+  SteadyClock::time_point retry_at_ BASE_GUARDED_BY(mutex_);
+  bool failed_ BASE_GUARDED_BY(mutex_) = false;
 };
 
 Source& TheSource() {

@@ -12,7 +12,6 @@
 #include <kova/instance.h>
 
 #include "base/path.h"
-#include "platform/host/files.h"
 
 namespace kova::host {
 
@@ -41,7 +40,7 @@ std::string Lower(std::string text) {
 }
 
 std::string LastComponentProblem(const std::string& name, const std::string& path) {
-  const std::string last = NameOf(path);
+  const std::string last = base::NameOf(path);
   if (last == name) return {};
   const std::string hint = Lower(last) == Lower(name) ? " (upper and lower case count)" : "";
   return "the folder " + path + " is called \"" + last + "\", not \"" + name + "\"" + hint +
@@ -77,7 +76,7 @@ std::string ShareFolderProblem(const ShareEntry& share) {
   }
   if (share.path != resolved) {
     return "the path " + share.path + " goes through a link or is not in its plain form; share " + resolved +
-           " under the name \"" + NameOf(resolved) + "\"";
+           " under the name \"" + base::NameOf(resolved) + "\"";
   }
   if (KOVAGetFSType(share.path.c_str(), 0) == KOVA_FS_PSEUDO) {
     return share.path + " is the system's own and holds no files of users; choose another folder";

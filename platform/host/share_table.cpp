@@ -6,7 +6,6 @@
 #include <atomic>
 #include <cerrno>
 #include <cstring>
-#include <mutex>
 
 #include <json/value.h>
 #include <json/writer.h>
@@ -14,6 +13,7 @@
 #include <kova/error.h>
 #include <kova/instance.h>
 
+#include "base/mutex.h"
 #include "platform/host/files.h"
 #include "platform/host/json_members.h"
 #include "platform/host/log.h"
@@ -106,14 +106,14 @@ void CheckBeside(const Json::Value& table, const ShareEntry& share, const std::s
 /// The table and Samba's shares as one, made anew when one of them is.
 std::shared_ptr<const ShareTable> WithSamba(const std::shared_ptr<const ShareTable>& own) {
   struct Made {
-    std::mutex mutex;
-    std::shared_ptr<const ShareTable> own, both;
-    std::shared_ptr<const std::vector<ShareEntry>> samba;
+    base::Mutex mutex;
+    std::shared_ptr<const ShareTable> own BASE_GUARDED_BY(mutex), both BASE_GUARDED_BY(mutex);
+    std::shared_ptr<const std::vector<ShareEntry>> samba BASE_GUARDED_BY(mutex);
   };
   static auto* made = new Made;  // never freed, like the table
   const std::shared_ptr<const std::vector<ShareEntry>> samba = SambaShares();
   if (samba == nullptr || !own->Problem().empty()) return own;
-  const std::lock_guard<std::mutex> guard(made->mutex);
+  const base::MutexLock lock(made->mutex);
   if (made->own != own || made->samba != samba) {
     made->both = std::make_shared<const ShareTable>(own->With(*samba));
     made->own = own;

@@ -12,11 +12,9 @@
 
 #include <kova/fs.h>
 
-#include "platform/host/files.h"
+#include "base/unique_fd.h"
 #include "platform/host/mounts.h"
 #include "platform/shared/failure.h"
-
-using kova::host::Fd;
 
 namespace {
 
@@ -28,7 +26,7 @@ bool IsMarker(const std::string& component, const std::string& parent_name) {
 
 /// Whether a read-only subvolume begins at `path`: the form that snapshots have on btrfs.
 bool IsReadOnlySubvolume(const std::string& path) {
-  const Fd folder(open(path.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
+  const base::UniqueFd folder(open(path.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
   struct stat info = {};
   struct statfs file_system = {};
   if (!folder.Valid() || fstat(folder.Get(), &info) != 0 || info.st_ino != kBtrfsSubvolumeInode) return false;

@@ -4,8 +4,9 @@
 
 #include <functional>
 #include <memory>
-#include <mutex>
 #include <string>
+
+#include "base/mutex.h"
 
 namespace kova::host {
 
@@ -24,7 +25,7 @@ class StatCache {
   std::shared_ptr<const T> Get(const std::string& path, const std::function<T(const std::string&)>& load) {
     struct stat now = {};
     if (stat(path.c_str(), &now) != 0) now = {};
-    const std::lock_guard<std::mutex> guard(mutex_);
+    const base::MutexLock lock(mutex_);
     if (content_ == nullptr || path != path_ || !SameFile(now, seen_)) {
       content_ = std::make_shared<const T>(load(path));
       path_ = path;
@@ -34,15 +35,15 @@ class StatCache {
   }
 
   void Forget() {
-    const std::lock_guard<std::mutex> guard(mutex_);
+    const base::MutexLock lock(mutex_);
     content_.reset();
   }
 
  private:
-  std::mutex mutex_;
-  std::string path_;
-  struct stat seen_ = {};
-  std::shared_ptr<const T> content_;
+  base::Mutex mutex_;
+  std::string path_ BASE_GUARDED_BY(mutex_);
+  struct stat seen_ BASE_GUARDED_BY(mutex_) = {};
+  std::shared_ptr<const T> content_ BASE_GUARDED_BY(mutex_);
 };
 
 }  // namespace kova::host

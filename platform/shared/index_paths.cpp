@@ -10,6 +10,7 @@
 
 #include <kova/instance.h>
 
+#include "base/files.h"
 #include "platform/shared/failure.h"
 
 namespace kova {
@@ -36,14 +37,6 @@ std::string WithoutTrailingSlashes(std::string path) {
   return path;
 }
 
-/// Makes the folders of `path` from byte `from` on, each with `mode`.
-bool MakeFolders(const std::string& path, size_t from, mode_t mode) {
-  for (size_t end = path.find('/', from + 1);; end = path.find('/', end + 1)) {
-    if (mkdir(path.substr(0, end).c_str(), mode) != 0 && errno != EEXIST) return false;
-    if (end == std::string::npos) return true;
-  }
-}
-
 std::string Compose(const std::string& share_path, const char* folder_name, const char* suffix) {
   const std::string path = WithoutTrailingSlashes(share_path);
   if (path.empty() || path.front() != '/') {
@@ -52,12 +45,12 @@ std::string Compose(const std::string& share_path, const char* folder_name, cons
   }
   const std::string state = InstanceRoot() + kStateFolder;
   const std::string folder = state + "/" + folder_name;
-  const size_t own = state.rfind('/');
   struct stat info = {};
   const bool is_there = stat(folder.c_str(), &info) == 0;
   // Whoever can open what lies here can hold its lock.
   if (is_there && (info.st_mode & 077) != 0 && info.st_uid == geteuid()) (void)chmod(folder.c_str(), 0700);
-  const bool made = is_there || (MakeFolders(state.substr(0, own), 0, 0755) && MakeFolders(folder, own, 0700));
+  const bool made =
+      is_there || (base::MakeFolders(state.substr(0, state.rfind('/'))) && base::MakeFolders(folder, 0700));
   if (!made) {
     (void)KOVA_FAIL_ERRNO();
     return {};

@@ -16,6 +16,8 @@
 
 #include <kova/lock_holder.h>
 
+#include "base/path.h"
+
 namespace kova {
 
 namespace {
@@ -86,11 +88,6 @@ LockHolder Describe(pid_t pid) {
   holder.command = StatusField(status, "Name");
   holder.user = static_cast<uid_t>(strtoul(StatusField(status, "Uid").c_str(), nullptr, 10));
   return holder;
-}
-
-std::string FolderOf(const std::string& path) {
-  const size_t slash = path.rfind('/');
-  return slash == std::string::npos ? "." : slash == 0 ? "/" : path.substr(0, slash);
 }
 
 bool IsOurs(uid_t user, const struct stat& folder) { return user == 0 || user == geteuid() || user == folder.st_uid; }
@@ -208,7 +205,7 @@ bool IsEnding(pid_t pid) {
 
 bool MakeLockFilePrivate(const std::string& path) {
   struct stat folder = {};
-  if (stat(FolderOf(path).c_str(), &folder) != 0) return false;
+  if (stat(base::FolderOf(path).c_str(), &folder) != 0) return false;
   if (geteuid() != 0 && geteuid() != folder.st_uid) return true;
   constexpr int kAttempts = 100;
   Outcome outcome = Outcome::kAgain;

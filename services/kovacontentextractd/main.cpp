@@ -5,6 +5,7 @@
 
 #include <kova/log.h>
 
+#include "base/files.h"
 #include "common/error.h"
 #include "common/paths.h"
 #include "services/kovacontentextractd/extractor.h"
@@ -47,7 +48,7 @@ extract::WorkerPool::Options PoolOptions() {
     options.programs[static_cast<size_t>(i)] = ProgramFolder() + "/" + ProgramName(static_cast<Program>(i));
   }
   options.empty_folder = InstancePath("/var/run/kovacontentextractd.empty");
-  (void)services::MakeFolders(options.empty_folder, 0555);
+  (void)base::MakeFolders(options.empty_folder, 0555);
   return options;
 }
 

@@ -22,6 +22,7 @@
 
 #include <json/writer.h>
 
+#include "base/files.h"
 #include "services/kovacontentextractd/sandbox.h"
 #include "services/kovacontentextractd/worker_protocol.h"
 #include "services/support/descriptor_passing.h"
@@ -39,18 +40,6 @@ bool ReadAll(void* to, size_t size) {
     if (got <= 0) return false;
     bytes += got;
     size -= static_cast<size_t>(got);
-  }
-  return true;
-}
-
-bool WriteAll(const void* from, size_t size) {
-  const auto* bytes = static_cast<const char*>(from);
-  while (size > 0) {
-    const ssize_t put = write(kWorkerSocket, bytes, size);
-    if (put < 0 && errno == EINTR) continue;
-    if (put <= 0) return false;
-    bytes += put;
-    size -= static_cast<size_t>(put);
   }
   return true;
 }
@@ -73,7 +62,7 @@ bool Answer(uint32_t number, const Json::Value& fields, size_t text_bytes = 0) {
   std::string bytes = ToText(fields);
   const AnswerHeader header = {static_cast<uint32_t>(bytes.size()), static_cast<uint32_t>(text_bytes), number};
   bytes.insert(0, reinterpret_cast<const char*>(&header), sizeof(header));
-  return WriteAll(bytes.data(), bytes.size());
+  return base::WriteAll(kWorkerSocket, bytes);
 }
 
 /// Text and attachments go to the region, to which `region` points: through a socket they would be copied twice more.
@@ -202,7 +191,7 @@ int RunWorker(const Worker& worker, const char* empty_folder) try {
     }
     (void)close(socket);
     (void)close(region);
-    if (!WriteAll(&answer, sizeof(answer))) return EXIT_FAILURE;
+    if (!base::WriteAll(kWorkerSocket, {reinterpret_cast<const char*>(&answer), sizeof(answer)})) return EXIT_FAILURE;
   }
   return 0;
 } catch (const std::bad_alloc&) {

@@ -12,6 +12,7 @@ struct FoldBlock {
   uint32_t last;
   const uint16_t* folded;
 };
+#include "base/text.h"
 #include "services/kovaelasticd/fold_tables.inc"  // kBlocks, kExpansionBase, kExpansions
 
 /// Code points that all mean the same for the splitting into words.
@@ -100,7 +101,7 @@ CharClass FoldByTable(std::string& folded, uint16_t to) {
   if (to >= kExpansionBase) {
     folded += kExpansions[to - kExpansionBase];
   } else {
-    AppendUtf8(folded, to);
+    base::AppendUtf8(folded, to);
   }
   return CharClass::kLetter;
 }
@@ -180,17 +181,6 @@ CodePoint DecodeAt(std::string_view text, size_t pos) {
   return decoded;
 }
 
-void AppendUtf8(std::string& out, uint32_t c) {
-  if (c < 0x80) {
-    out += static_cast<char>(c);
-    return;
-  }
-  const int tail = c < 0x800 ? 1 : c < 0x10000 ? 2 : 3;
-  constexpr unsigned char kLead[] = {0, 0xC0, 0xE0, 0xF0};
-  out += static_cast<char>(kLead[tail] | (c >> (6 * tail)));
-  for (int i = tail - 1; i >= 0; --i) out += static_cast<char>(0x80 | ((c >> (6 * i)) & 0x3F));
-}
-
 CharClass FoldTo(std::string& folded, uint32_t c) {
   if (c >= 0xFF01 && c <= 0xFF5E) c -= 0xFF01 - 0x21;  // full-width forms of ASCII
   if (c < 0x80) return FoldAscii(folded, c);
@@ -200,7 +190,7 @@ CharClass FoldTo(std::string& folded, uint32_t c) {
   }
   const CharClass char_class = ClassOf(c);
   if (c >= 0x531 && c <= 0x556) c += 0x30;  // Armenian capitals
-  if (char_class == CharClass::kLetter || char_class == CharClass::kPaired) AppendUtf8(folded, c);
+  if (char_class == CharClass::kLetter || char_class == CharClass::kPaired) base::AppendUtf8(folded, c);
   return char_class;
 }
 
@@ -210,7 +200,7 @@ std::string FoldText(std::string_view text) {
   for (size_t pos = 0; pos < text.size();) {
     const CodePoint c = DecodeAt(text, pos);
     pos += c.length_bytes;
-    if (FoldTo(folded, c.value) == CharClass::kSeparator) AppendUtf8(folded, c.value);
+    if (FoldTo(folded, c.value) == CharClass::kSeparator) base::AppendUtf8(folded, c.value);
   }
   return folded;
 }

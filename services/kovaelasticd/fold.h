@@ -28,8 +28,6 @@ struct CodePoint {
 /// three parts of a Korean syllable (both are how macOS writes file names), are decoded as the one composed character.
 CodePoint DecodeAt(std::string_view text, size_t pos);
 
-void AppendUtf8(std::string& out, uint32_t code_point);
-
 /// Appends the folded form of a letter (no case, no accent; up to two letters, "ss" for a sharp s) or of a paired
 /// character to `folded`. Nothing is appended for the other classes.
 /// @return the character's class.

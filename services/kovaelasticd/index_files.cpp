@@ -9,9 +9,10 @@
 #include <memory>
 #include <vector>
 
+#include "base/files.h"
+#include "base/path.h"
 #include "common/file_util.h"
 #include "common/log.h"
-#include "services/support/daemon.h"
 
 namespace ferrox::engine {
 
@@ -19,16 +20,14 @@ namespace {
 
 constexpr char kSetAside[] = ".damaged-";
 
-std::string ParentOf(const std::string& path) { return Dirname(path).empty() ? "/" : Dirname(path); }
-
 /// What was set aside of the file at `path`.
 std::vector<std::string> SetAsideOf(const std::string& path) {
   std::vector<std::string> found;
-  const std::unique_ptr<DIR, int (*)(DIR*)> folder(opendir(ParentOf(path).c_str()), &closedir);
+  const std::unique_ptr<DIR, int (*)(DIR*)> folder(opendir(base::FolderOf(path).c_str()), &closedir);
   if (folder == nullptr) return found;
   while (const dirent* entry = readdir(folder.get())) {
     if (StringStartWith(entry->d_name, Basename(path) + kSetAside))
-      found.push_back(ParentOf(path) + "/" + entry->d_name);
+      found.push_back(base::FolderOf(path) + "/" + entry->d_name);
   }
   return found;
 }
@@ -55,11 +54,11 @@ bool IsIndexFileLost(const std::string& folder) {
 std::string MountPointOf(const std::string& path) {
   std::string at = path;
   struct stat here = {};
-  while (at != "/" && stat(at.c_str(), &here) != 0) at = ParentOf(at);
+  while (at != "/" && stat(at.c_str(), &here) != 0) at = base::FolderOf(at);
   struct stat above = {};
-  while (at != "/" && stat(at.c_str(), &here) == 0 && stat(ParentOf(at).c_str(), &above) == 0 &&
+  while (at != "/" && stat(at.c_str(), &here) == 0 && stat(base::FolderOf(at).c_str(), &above) == 0 &&
          above.st_dev == here.st_dev) {
-    at = ParentOf(at);
+    at = base::FolderOf(at);
   }
   return at;
 }
@@ -79,7 +78,7 @@ void SetAside(const std::string& path, int64_t now) {
   const std::string kept = path + kSetAside + Day(now);
   FERROX_FAIL_IF(chmod(path.c_str(), 0600) != 0 || rename(path.c_str(), kept.c_str()) != 0, Error::kEngineStorage,
                  "cannot set " + path + " aside: " + ErrnoText());
-  SyncIndexFolder(ParentOf(path));
+  SyncIndexFolder(base::FolderOf(path));
 }
 
 void SetAsideIndexFiles(const std::string& folder, int64_t now) {
@@ -97,7 +96,7 @@ void SyncIndexFolder(const std::string& folder) {
 }
 
 void MakeIndexFolder(const std::string& folder) {
-  FERROX_FAIL_IF(!services::MakeFolders(folder, 0700), Error::kEngineStorage,
+  FERROX_FAIL_IF(!base::MakeFolders(folder, 0700), Error::kEngineStorage,
                  "cannot make the folder " + folder + ": " + ErrnoText());
   SyncIndexFolder(Dirname(folder).empty() ? "/" : Dirname(folder));
 }

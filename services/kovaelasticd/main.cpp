@@ -5,6 +5,7 @@
 
 #include <kova/log.h>
 
+#include "base/files.h"
 #include "common/error.h"
 #include "common/paths.h"
 #include "services/kovaelasticd/engine.h"
@@ -31,7 +32,7 @@ void Serve() {
   constexpr unsigned kWorkers = 16;  // requests at a time: most wait for an index's thread or the disk
   services::Daemon daemon("kovaelasticd");
   const std::string state_folder = InstancePath("/var/lib/kova/kovaelasticd");
-  if (!services::MakeFolders(state_folder, 0700)) {
+  if (!base::MakeFolders(state_folder, 0700)) {
     throw Error(Error::kInternal, "cannot make the folder " + state_folder);
   }
   engine::Engine engine(state_folder);

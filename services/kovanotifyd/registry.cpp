@@ -4,8 +4,8 @@
 #include <syslog.h>
 #include <unistd.h>
 
+#include "base/files.h"
 #include "common/log.h"
-#include "services/support/daemon.h"
 
 namespace ferrox::notifyd {
 
@@ -33,7 +33,7 @@ void RegistryWatch::Rearm() {
   constexpr uint32_t kChanges =
       IN_MOVED_TO | IN_MOVED_FROM | IN_DELETE | IN_CLOSE_WRITE | IN_DELETE_SELF | IN_MOVE_SELF | IN_ONLYDIR;
   if (inotify_add_watch(inotify_.Get(), folder_.c_str(), kChanges) >= 0) return;
-  (void)services::MakeFolders(folder_);
+  (void)base::MakeFolders(folder_);
   (void)inotify_add_watch(inotify_.Get(), folder_.c_str(), kChanges);
 }
 

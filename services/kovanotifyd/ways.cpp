@@ -3,13 +3,13 @@
 #include <algorithm>
 #include <utility>
 
+#include "base/files.h"
 #include "common/file_util.h"
 #include "common/paths.h"
 #include "services/kovanotifyd/filesystem/filesystem_watcher.h"
 #include "services/kovanotifyd/folders/fan_inode_port.h"
 #include "services/kovanotifyd/folders/folder_watcher.h"
 #include "services/kovanotifyd/folders/inotify_port.h"
-#include "services/support/daemon.h"
 
 namespace ferrox::notifyd {
 
@@ -84,7 +84,7 @@ std::vector<std::string> OwnPaths() {
   std::vector<std::string> paths;
   for (const char* folder : {"/var/lib/kova", "/var/log/kova", kConfigurationFolder, "/var/run"}) {
     const std::string path = InstancePath(folder);
-    (void)services::MakeFolders(path);
+    (void)base::MakeFolders(path);
     const std::string real = RealPath(path);
     paths.push_back((real.empty() ? path : real) + "/");
   }

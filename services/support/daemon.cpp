@@ -21,8 +21,8 @@
 
 #include <kova/lock_holder.h>
 
+#include "base/files.h"
 #include "common/clock.h"
-#include "common/file_util.h"
 #include "common/log.h"
 #include "common/paths.h"
 
@@ -89,11 +89,6 @@ base::UniqueFd TakePidFile(const std::string& path, const std::string& name) {
 
 }  // namespace
 
-bool MakeFolders(const std::string& path, mode_t mode) {
-  if (path.empty() || mkdir(path.c_str(), mode) == 0 || errno == EEXIST) return true;
-  return errno == ENOENT && MakeFolders(Dirname(path), mode) && (mkdir(path.c_str(), mode) == 0 || errno == EEXIST);
-}
-
 void GuardLockFiles() {
   for (const char* path : {kFolderLockPath, kStatusLockPath}) {
     if (!kova::MakeLockFilePrivate(InstancePath(path))) {
@@ -108,7 +103,7 @@ Daemon::Daemon(const std::string& name) : name_(name) {
   const std::string problem = InstanceRootProblem();
   FERROX_FAIL_IF(!problem.empty(), Error::kInternal, problem);
   for (const char* folder : {"/var/run", "/tmp", kConfigurationFolder}) {
-    FERROX_FAIL_IF(!MakeFolders(InstancePath(folder)), Error::kInternal,
+    FERROX_FAIL_IF(!base::MakeFolders(InstancePath(folder)), Error::kInternal,
                    "cannot make " + InstancePath(folder) + ": " + ErrnoText());
   }
   MakeStacksSmall();

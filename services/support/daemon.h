@@ -34,7 +34,4 @@ class Daemon {
 /// Keeps others from the lock files that all processes of the instance share (kova/lock_holder.h).
 void GuardLockFiles();
 
-/// Makes a folder and those above it, mode 0755 unless said; true when it exists afterwards.
-bool MakeFolders(const std::string& path, mode_t mode = 0755);
-
 }  // namespace ferrox::services

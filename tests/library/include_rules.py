@@ -12,7 +12,7 @@ LIBRARY = ["base", "common", "sdk", "wire", "fileindex", "fileindex/queue", "fil
            "fileindex/elastic", "fileindex/operations"]
 MAY = {
     "base": [],
-    "platform/include": [],
+    "platform/include": ["base"],
     "platform/shared": ["base"],
     "platform/host": ["base", "platform/shared"],
     "common": ["base"],
@@ -31,7 +31,7 @@ DAEMONS = ("fileindexd", "kovacontentextractd", "kovaelasticd", "kovanotifyd", "
 MAY |= {f"services/{name}": LIBRARY + ["services/support"] for name in DAEMONS}
 # The installed paths of headers that lie in a room, here and in the programs that use the library.
 FORWARDING = {f"fileindex/{name}.h" for name in ("folder", "folder_mgr", "index_mgr", "optree", "queue_mgr", "watch_list")}
-FORWARDING |= {"common/unique_fd.h", "common/scope_exit.h", "fileindex/elastic/fields.h"}
+FORWARDING |= {"common/unique_fd.h", "common/scope_exit.h", "platform/include/kova/text.h", "fileindex/elastic/fields.h"}
 # What reaches further, and why.
 EXCEPTIONS = {
     # A queue is read into a tree, and one that is searched keeps the folders loaded.

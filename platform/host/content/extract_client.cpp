@@ -8,14 +8,13 @@
 #include <algorithm>
 #include <chrono>
 #include <memory>
-#include <mutex>
 #include <optional>
 #include <sstream>
 #include <stdexcept>
 #include <string_view>
 #include <utility>
 
-#include <json/reader.h>
+#include <json/value.h>
 #include <json/writer.h>
 
 #include <kova/content_extract.h>
@@ -23,8 +22,10 @@
 #include <kova/service.h>
 #include <kova/sock_connection.h>
 
+#include "base/json.h"
+#include "base/mutex.h"
+#include "base/path.h"
 #include "platform/host/child_service.h"
-#include "platform/host/files.h"
 #include "platform/host/share_table.h"
 #include "platform/shared/frames.h"
 
@@ -55,15 +56,15 @@ thread_local std::string t_problem;
 std::string RootOf(const std::string& path) {
   const std::shared_ptr<const host::ShareTable> table = host::ShareTable::Current();
   const host::ShareEntry* entry = table != nullptr ? table->ByFullPath(path) : nullptr;
-  return entry != nullptr && entry->path != path ? entry->path : host::FolderOf(path);
+  return entry != nullptr && entry->path != path ? entry->path : base::FolderOf(path);
 }
 
 /// Starts the daemon once for all threads that find it missing. @return "" when it runs, else the reason.
 std::string StartDaemon() {
-  static std::mutex mutex;
-  static SteadyClock::time_point failed_at;
-  static std::string failure;
-  const std::lock_guard<std::mutex> guard(mutex);
+  static base::Mutex mutex;
+  static SteadyClock::time_point failed_at BASE_GUARDED_BY(mutex);
+  static std::string failure BASE_GUARDED_BY(mutex);
+  const base::MutexLock lock(mutex);
   if (!failure.empty() && SteadyClock::now() - failed_at < kStartPause) return failure;
   failure.clear();
   if (KLIBServiceStart(kService, 1) >= 0) return {};
@@ -181,8 +182,8 @@ bool FindText(const std::string& reply, size_t json_bytes, const Json::Value& da
 
 bool ReadReply(const std::string& reply, Json::Value& json, std::string_view& text) try {
   const size_t json_bytes = std::min(reply.find('\0'), reply.size());
-  thread_local const std::unique_ptr<Json::CharReader> reader(Json::CharReaderBuilder().newCharReader());
-  if (!reader->parse(reply.data(), reply.data() + json_bytes, &json, nullptr) || !json.isObject()) return false;
+  const std::string_view json_text = std::string_view(reply).substr(0, json_bytes);
+  if (!base::ParseJson(json_text, base::JsonRules::kAnyValue, json) || !json.isObject()) return false;
   if (!json["success"].isBool() || json["data"].isObject() != json["success"].asBool()) return false;
   return FindText(reply, json_bytes, json["data"], text);
 } catch (const std::exception&) {

@@ -5,7 +5,7 @@
 
 #include <cstdlib>
 
-#include "platform/host/files.h"
+#include "base/path.h"
 
 namespace kova::content {
 
@@ -14,10 +14,10 @@ namespace {
 std::string FindFolder() {
   char self[4096] = {};
   const ssize_t length = readlink("/proc/self/exe", self, sizeof(self) - 1);
-  const std::string own = length > 0 ? host::FolderOf(std::string(self, static_cast<size_t>(length))) : "";
+  const std::string own = length > 0 ? base::FolderOf(std::string(self, static_cast<size_t>(length))) : "";
   const char* given = secure_getenv("FERROX_LIBEXEC");
   for (const std::string& folder :
-       {std::string(given != nullptr ? given : ""), own, host::FolderOf(own) + "/libexec"}) {
+       {std::string(given != nullptr ? given : ""), own, base::FolderOf(own) + "/libexec"}) {
     struct stat info = {};
     const std::string path = folder + "/" + ProgramName(Program::kGeneral);
     if (!folder.empty() && stat(path.c_str(), &info) == 0 && S_ISREG(info.st_mode)) return folder;

@@ -1,64 +1,12 @@
 #pragma once
 
-#include <cstdint>
-#include <cstdio>
-#include <string>
-#include <string_view>
+#include "base/text.h"
 
-/// What of a text may be shown as it is: names and contents are bytes that somebody else has chosen.
+/// Here for programs that include this path: the functions themselves are base's.
 namespace kova {
 
-/// The number of bytes of the UTF-8 character that `text` begins with, 0 when it begins with none.
-inline size_t CharacterBytes(std::string_view text) {
-  if (text.empty()) return 0;
-  const auto byte = [&text](size_t at) { return static_cast<unsigned char>(text[at]); };
-  const unsigned char first = byte(0);
-  if (first < 0x80) return 1;
-  const size_t length = first >= 0xF0 ? 4 : first >= 0xE0 ? 3 : 2;
-  if (first < 0xC2 || first > 0xF4 || text.size() < length) return 0;
-  for (size_t i = 1; i < length; ++i) {
-    if ((byte(i) & 0xC0) != 0x80) return 0;
-  }
-  // Overlong forms, surrogates, and what lies beyond the last character.
-  const unsigned char second = byte(1);
-  const bool refused = (first == 0xE0 && second < 0xA0) || (first == 0xED && second > 0x9F) ||
-                       (first == 0xF0 && second < 0x90) || (first == 0xF4 && second > 0x8F);
-  return refused ? 0 : length;
-}
-
-/// The code point of a character that is a control, whether a terminal obeys it (C0, DEL, the C1 controls, the breaks
-/// of lines and paragraphs) or it turns the direction of what stands around it; -1 for any other character.
-inline int ControlCodePoint(std::string_view character) {
-  const auto low = [&character](size_t at) { return character[at] & 0x3F; };
-  const auto first = static_cast<unsigned char>(character[0]);
-  if (character.size() == 1) return first < 0x20 || first == 0x7F ? first : -1;
-  if (character.size() > 3) return -1;
-  const int code = character.size() == 2 ? (first & 0x1F) << 6 | low(1) : (first & 0x0F) << 12 | low(1) << 6 | low(2);
-  const bool control = code < 0xA0 || code == 0x61C || code == 0x200E || code == 0x200F ||
-                       (code >= 0x2028 && code <= 0x202E) || (code >= 0x2066 && code <= 0x2069);
-  return control ? code : -1;
-}
-
-/// The text with each byte of a control, and each that is not part of valid UTF-8, in the form of `format`, that takes
-/// an unsigned number; controls that are in `kept` stay.
-inline std::string WithoutControls(std::string_view text, const char* format, std::string_view kept = {}) {
-  std::string out;
-  out.reserve(text.size());
-  while (!text.empty()) {
-    const size_t length = CharacterBytes(text);
-    const std::string_view taken = text.substr(0, length == 0 ? 1 : length);
-    if (length != 0 && (ControlCodePoint(taken) < 0 || kept.find(taken) != kept.npos)) {
-      out += taken;
-    } else {
-      for (const char byte : taken) {
-        char escaped[8];
-        (void)snprintf(escaped, sizeof(escaped), format, static_cast<unsigned>(static_cast<unsigned char>(byte)));
-        out += escaped;
-      }
-    }
-    text.remove_prefix(taken.size());
-  }
-  return out;
-}
+using base::CharacterBytes;
+using base::ControlCodePoint;
+using base::WithoutControls;
 
 }  // namespace kova

@@ -5,6 +5,8 @@
 #include <string>
 #include <string_view>
 
+#include "base/text.h"
+
 namespace ferrox::extract {
 
 /// How many bytes at the beginning of `text` are valid UTF-8: all of them when it is. Ends at the first bad byte, so
@@ -17,7 +19,6 @@ bool IsUtf8(std::string_view text, bool cut);
 /// The longest prefix of valid UTF-8 of at most `limit_bytes` that ends at a character's border.
 std::string_view CutAtCharacter(std::string_view text, size_t limit_bytes);
 
-/// Appends a character; U+FFFD for what is none: a surrogate, or a number beyond U+10FFFF.
-void AppendUtf8(std::string& out, uint32_t code_point);
+using base::AppendUtf8;
 
 }  // namespace ferrox::extract
