@@ -106,7 +106,7 @@ std::string FolderText(const Json::Value& folder) {
   return text + (TextOf(status, "desc").empty() ? "" : " (" + TextOf(status, "desc") + ")") + "\n";
 }
 
-/// The library leaves folders of which the state cannot be told out of a page. Here they stay, without it, and standard
+/// The library leaves folders out of a page whose state it cannot find out. Here they stay, without it, and standard
 /// error says why. True when there were none.
 bool AddStates(Json::Value& folders, const Json::Value& with_states) {
   const FolderMgr configured;
@@ -117,7 +117,7 @@ bool AddStates(Json::Value& folders, const Json::Value& with_states) {
       folder = with_states[next++];
       continue;
     }
-    std::string reason = "try again";  // it could not be told a moment ago
+    std::string reason = "try again";  // now it can be found out: something changed in between
     try {
       std::shared_ptr<fileindex::Folder> one;
       configured.Get(one, path);

@@ -66,7 +66,7 @@ void StopSupervisor() {
   if (ran) ReportSupervisor("stopped");
 }
 
-/// A daemon that could not be told takes the pause from the status file when it starts.
+/// A daemon that was not reached takes the pause from the status file when it starts.
 int ReportPause(void (*change)(int hours), int hours, const std::string& report) {
   try {
     change(hours);

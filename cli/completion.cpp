@@ -157,7 +157,7 @@ std::vector<std::string> Completions(std::vector<std::string> words) {
   Words found;
   for (const std::string& candidate : AllCompletions(words)) {
     const bool for_shell = candidate.compare(0, 1, ":") == 0;
-    if (candidate.find('\n') != std::string::npos) continue;  // such a name cannot be told on a line
+    if (candidate.find('\n') != std::string::npos) continue;  // such a name does not fit on a line
     if (for_shell || StringStartWith(candidate, typed)) found.push_back(candidate);
   }
   std::sort(found.begin(), found.end());

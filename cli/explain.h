@@ -6,7 +6,7 @@
 
 namespace ferrox::cli {
 
-/// How the library's failures are told to people. What went wrong and the remedy follow from the error's code and from
+/// How the library's failures are put to people. What went wrong and the remedy follow from the error's code and from
 /// what it is about (SubjectError); the reason's text is shown where it is the best there is, and never searched.
 
 /// "<what went wrong>; <the remedy>; <note> (error <code>)", without what is empty. Where the failure comes from a

@@ -30,7 +30,7 @@ std::string ShareOf(const std::string& index_id) {
 bool HasFolders(const std::string& share) try {
   return fileindex::FolderMgr().IsShareIndexed(share);
 } catch (const Error&) {
-  return true;  // not known: told where the list of folders is needed
+  return true;  // not known; commands that need the list of folders say why
 }
 
 /// In the words of the tool, where the engine refused with `code` and `reason`.

@@ -33,7 +33,7 @@ class FERROX_EXPORT StatusMgr {
   void UnsetShareStatus(const std::string& share, int bits);
   void ClearShareStatus(const std::string& share);
 
-  /// Pauses indexing for `hours`, without end when 0, and tells the index daemon; a daemon that cannot be told
+  /// Pauses indexing for `hours`, without end when 0, and has the index daemon pause; a daemon that is not reached
   /// (kInternal) leaves the pause recorded. @throws Error kBadArgument when `hours` is negative, with nothing changed.
   void Pause(int hours);
   /// Ends a pause and tells the index daemon, as above.

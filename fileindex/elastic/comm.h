@@ -14,8 +14,8 @@ namespace ferrox::fileindex::elastic {
 /// the reply's error is not as it must be.
 FERROX_EXPORT void SendRequestImpl(Json::Value& res, const Json::Value& req);
 
-/// The same, asking again every 15 to 19 minutes for as long as the engine is busy; the administrators are told once
-/// after the 11th time. Blocks without an upper bound.
+/// The same, asking again every 15 to 19 minutes for as long as the engine is busy; the administrators are notified
+/// once after the 11th time. Blocks without an upper bound.
 FERROX_EXPORT void SendRequest(Json::Value& res, const Json::Value& req);
 /// The same, without the reply.
 FERROX_EXPORT void SendRequest(const Json::Value& req);

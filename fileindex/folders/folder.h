@@ -28,6 +28,7 @@ class FERROX_EXPORT Folder {
 
   /// The share path, as it was given.
   const std::string& GetPath() const { return path_; }
+  /// What people call the folder; need not be unique.
   const std::string& GetName() const { return name_; }
 
   /// Whether the content of files of the kind is indexed; which file is of which kind, GetFileTypeByFullPath tells.
@@ -52,13 +53,14 @@ class FERROX_EXPORT Folder {
   /// Moves the entry to another share. Deliberate: a full path that was asked for before stays as it was; make a new
   /// Folder to learn the new one. @throws Error kBadArgument when the path has no share.
   void SetShare(const std::string& new_share);
-  /// Replaces the path; share and full path are computed anew.
+  /// Replaces the path; share and full path are computed anew. Nothing is checked: neither that its share is there nor
+  /// that no other entry has this path.
   void SetPath(const std::string& path);
   /// These two only change the entry: FolderMgr::Save stores it, and nothing is paused or cleaned by them alone.
   void SetPaused(bool paused) { paused_ = paused; }
   void SetVolumeToBeClean(const std::string& mount_point) { volume_to_be_clean_ = mount_point; }
 
-  /// The stored form, every member present.
+  /// The stored form, every member present, as the constructor from JSON takes it back.
   Json::Value GetData() const;
   /// The four kinds alone: "document", "audio", "video", "photo".
   Json::Value GetIndexCfg() const;
@@ -74,6 +76,7 @@ class FERROX_EXPORT Folder {
   Json::Value GetDataWithAdditional(const Json::Value& additionals) const;
 
  private:
+  // The two that know where shares lie, having asked once for many folders.
   friend class FolderStatus;
   friend struct FolderLookup;
 
@@ -90,8 +93,8 @@ class FERROX_EXPORT Folder {
   bool photo_ = false;
   bool privileged_ = false;
   bool paused_ = false;
-  mutable std::string share_;
-  mutable std::string full_path_;
+  mutable std::string share_;      ///< "" until it is asked for
+  mutable std::string full_path_;  ///< likewise
 };
 
 }  // namespace ferrox::fileindex

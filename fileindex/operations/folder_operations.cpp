@@ -119,7 +119,7 @@ void RebuildShare(const std::string& share_name) {
   AddCustomEvent(EVENT_REINDEX, share.GetPath(), "", Json::Value());
 }
 
-/// Appends the folder to a page; one that cannot be told is left out.
+/// Appends the folder to a page; one whose state cannot be found out is left out.
 void AppendFolder(Json::Value& page, FolderStatus& status, const Folder& folder, const Json::Value& additional) {
   try {
     page.append(status.GetDataWithAdditional(folder, additional));

@@ -40,7 +40,8 @@ FERROX_EXPORT void FolderDelete(const Json::Value& path_list);
 /// The stored form of one folder. @throws Error kNoSuchFolder.
 FERROX_EXPORT void FolderGet(Json::Value& out, const std::string& path);
 /// One page of the folders, sorted as FolderMgr::List does: {"folder": [...], "total", "offset"}, each with the
-/// `additional` blocks (an array of names, Folder::GetDataWithAdditional). A folder that cannot be told is left out.
+/// `additional` blocks (an array of names, Folder::GetDataWithAdditional). A folder of which a block cannot be made is
+/// left out.
 FERROX_EXPORT void FolderList(Json::Value& out, unsigned int offset, unsigned int limit, const std::string& sort_by,
                               const std::string& sort_direction, const Json::Value& additional);
 
