@@ -8,7 +8,9 @@
 
 namespace ferrox::extract {
 
-/// A child of this process, ended at the latest with this object.
+/// A child of this process, ended at the latest with this object. Waits go by a descriptor of the process (pidfd_open),
+/// so they end as soon as the child does; kernels before 5.3 are asked every millisecond. For one thread at a time,
+/// apart from Held.
 class ChildProcess {
  public:
   explicit ChildProcess(pid_t pid = -1) : pid_(pid) {}

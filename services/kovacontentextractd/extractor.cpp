@@ -130,6 +130,7 @@ std::string Extractor::Handle(const std::string& request, const services::Peer& 
   return reply;
 }
 
+/// A file that is gone has no document; any other has one, if only with the reason why there is nothing else in it.
 Json::Value Extractor::Extract(const std::string& root, const std::string& path, TextTarget& text) {
   Json::Value found;
   const OpenedFile file = OpenFile(root, path);
@@ -167,6 +168,7 @@ Extractor::OpenedFile Extractor::OpenFile(const std::string& root, const std::st
   return file;
 }
 
+/// An opened file: its own text and fields, then the texts of the files within it.
 Json::Value Extractor::Read(int fd, std::string_view head, const std::string& path, TextTarget& text) {
   Json::Value document(Json::objectValue);
   const TextSink sink = [&text](size_t offset, std::string_view piece) { text.Take(offset, piece); };
@@ -233,6 +235,8 @@ size_t Extractor::AddAttachments(const Answer& answer, Json::Value& document, Te
   return bytes;
 }
 
+/// Has a worker of the format's program read the file. Where that is not installed, the document says so, with a
+/// version that makes the file be read again.
 Answer Extractor::ReadAs(const Format& format, const Task& task, Json::Value& document, const TextSink& sink) {
   Task complete = task;
   complete.reader = format.reader;

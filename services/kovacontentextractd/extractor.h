@@ -28,9 +28,9 @@ class TextTarget {
   void AddTo(std::string& reply) const;
 
  private:
-  int memory_;
-  size_t bytes_ = 0;
-  std::string text_;
+  int memory_;        ///< the client's descriptor; below 0: there is none
+  size_t bytes_ = 0;  ///< of the whole text
+  std::string text_;  ///< when there is no memory
 };
 
 /// Gives back what a client's memory took of the system's; the client finds zeros there afterwards.
@@ -54,6 +54,7 @@ class Extractor {
   Json::Value Extract(const std::string& root, const std::string& path, TextTarget& text);
 
  private:
+  /// What opening a file gave.
   struct OpenedFile {
     base::UniqueFd fd;
     int problem = 0;     ///< an error number
@@ -61,6 +62,7 @@ class Extractor {
     bool regular = false;
     std::string head;  ///< its first bytes
   };
+  // The steps of Extract.
   OpenedFile OpenFile(const std::string& root, const std::string& path);
   Json::Value Read(int fd, std::string_view head, const std::string& path, TextTarget& text);
   Answer ReadFile(const Task& task, std::string_view head, Json::Value& document, const TextSink& sink);

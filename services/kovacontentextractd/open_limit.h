@@ -16,6 +16,7 @@ namespace ferrox::extract {
 /// member; none blocks.
 class OpenLimit {
  private:
+  /// One that is under way.
   struct Opening {
     std::string root;
     std::chrono::steady_clock::time_point since;
@@ -47,6 +48,7 @@ class OpenLimit {
   Json::Value Held() const;
 
  private:
+  // What a Turn does at its begin and end.
   std::list<Opening>::iterator Begin(const std::string& root);
   void End(std::list<Opening>::iterator opening);
 

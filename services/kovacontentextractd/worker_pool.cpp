@@ -160,6 +160,7 @@ void WorkerPool::Count(bool answered) {
   if (!answered) ++blamed_;
 }
 
+/// The one that came back last: its memory is the likeliest to be in the processor's caches, and the others grow old.
 std::unique_ptr<WorkerProcess> WorkerPool::TakeIdle(Program program) {
   const auto last = std::find_if(idle_.rbegin(), idle_.rend(), [&](const Idle& one) { return one.program == program; });
   if (last == idle_.rend()) return nullptr;
@@ -168,6 +169,8 @@ std::unique_ptr<WorkerProcess> WorkerPool::TakeIdle(Program program) {
   return worker;
 }
 
+/// Waits for a place among workers_max, then takes an idle worker of the program or starts one. With `fresh`, one that
+/// has read no other file.
 std::unique_ptr<WorkerProcess> WorkerPool::Take(Program program, bool fresh) {
   std::unique_ptr<WorkerProcess> given_up;
   {
@@ -192,6 +195,7 @@ std::unique_ptr<WorkerProcess> WorkerPool::Take(Program program, bool fresh) {
   }
 }
 
+/// Has the program's template make a worker, and starts that where there is none.
 std::unique_ptr<WorkerProcess> WorkerPool::Fork(Program program) {
   Prepared& prepared = PreparedFor(program);
   const base::MutexLock guard(prepared.mutex);
@@ -215,6 +219,7 @@ void WorkerPool::EndPrepared(Program program) {
   prepared.process.reset();
 }
 
+/// A new worker; what of the sandbox it lacks is logged when it is not what the last one lacked.
 std::unique_ptr<WorkerProcess> WorkerPool::Start(Program program) {
   std::unique_ptr<WorkerProcess> worker = Fork(program);
   const base::MutexLock guard(mutex_);

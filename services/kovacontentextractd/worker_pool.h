@@ -77,14 +77,16 @@ class WorkerPool {
     SteadyClock::time_point used BASE_GUARDED_BY(mutex);
   };
 
-  class Lease;
-  class Asked;
+  class Lease;  ///< a worker on loan
+  class Asked;  ///< its time with a file
   std::unique_ptr<WorkerProcess> TakeIdle(kova::content::Program program) BASE_REQUIRES(mutex_);
   std::unique_ptr<WorkerProcess> Take(kova::content::Program program, bool fresh);
+  /// Takes a worker back, or notes that one on loan has ended.
   void Give(std::unique_ptr<WorkerProcess> worker, kova::content::Program program);
   std::unique_ptr<WorkerProcess> Start(kova::content::Program program);
   std::unique_ptr<WorkerProcess> Fork(kova::content::Program program);
   Prepared& PreparedFor(kova::content::Program program) { return prepared_[static_cast<size_t>(program)]; }
+  /// Ends a program's template; the next worker is forked from a new one.
   void EndPrepared(kova::content::Program program);
   void EndIdle();
   bool EndIdleTemplates(SteadyClock::time_point old);

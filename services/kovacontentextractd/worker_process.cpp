@@ -38,6 +38,7 @@ int MillisecondsUntil(SteadyClock::time_point end) {
 
 }  // namespace
 
+/// The greeting comes once the sandbox is closed, and says what of it this kernel lacks.
 WorkerProcess::WorkerProcess(WorkerTemplate& prepared) : region_(MakeRegion()) {
   FERROX_FAIL_IF(!region_.Valid(), Error::kInternal, "no memory to share: " + ErrnoText());
   int ends[2];
@@ -56,6 +57,8 @@ WorkerProcess::WorkerProcess(WorkerTemplate& prepared) : region_(MakeRegion()) {
   missing_ = json["missing"];
 }
 
+/// A worker that waits for a file has nothing to say: whatever can be read says that it has ended, or is not to be
+/// trusted.
 bool WorkerProcess::IsReady() const {
   pollfd state = {socket_.Get(), POLLIN, 0};
   return poll(&state, 1, 0) == 0;  // the end is readable, and so is what nobody asked for

@@ -72,6 +72,8 @@ bool WorkerTemplate::IsReady() const {
   return poll(&state, 1, 0) == 0;  // its end is readable
 }
 
+/// The first one waits for the program to be loaded. The template answers with a process number that is a child of this
+/// process, since it forks with CLONE_PARENT.
 pid_t WorkerTemplate::Fork(int socket, int region) {
   const bool asked = services::SendWithDescriptors(socket_.Get(), std::string_view(&kForkRequest, 1), {socket, region});
   pollfd state = {socket_.Get(), POLLIN, 0};

@@ -35,9 +35,11 @@ class CompoundParts {
     }
   }
 
+  /// Whether all parts were taken.
   bool AtEnd() const { return next_ == texts_.size(); }
   /// The next part, not at the end.
   Json::Value& Front();
+  /// The same, which is no longer kept here.
   Json::Value Take();
   /// The next parts, at least one: as many as `belong` and may be trees together.
   template <typename Belongs>
@@ -54,12 +56,14 @@ class CompoundParts {
  private:
   /// How much memory the trees of parts may take together, about.
   static constexpr size_t kTreesBytes = 32 << 20;
+  /// What a part's tree takes, by its text.
   static size_t TreeBytes(std::string_view text);
+  /// The elements of the array as they stand in its text.
   static std::vector<std::string_view> TextsOf(std::string_view array);
 
-  std::vector<std::string_view> texts_;
-  size_t next_ = 0;
-  std::deque<Json::Value> trees_;  ///< of the next parts, as far as they have been parsed
+  std::vector<std::string_view> texts_;  ///< of all parts, within the request
+  size_t next_ = 0;                      ///< the part that Front gives
+  std::deque<Json::Value> trees_;        ///< of the next parts, as far as they have been parsed
 };
 
 }  // namespace ferrox::engine

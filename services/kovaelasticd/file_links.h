@@ -18,6 +18,7 @@ class FileLinks {
   /// The member of a document that tells what was seen of its file.
   static constexpr auto& kStamp = fileindex::elastic::k_KOVAStamp;
 
+  /// Both must outlive this; `names` are those that the rows are packed with.
   FileLinks(Database& database, const FieldNames& names) : database_(database), names_(names) {}
 
   /// Makes the tables where they are missing.

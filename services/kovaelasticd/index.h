@@ -44,6 +44,7 @@ class Index {
   void Read(const Job& job);
   /// Makes everything that was answered before durable.
   void Commit();
+  /// Search and Stat run on the caller's thread and see the last commit.
   SearchReply Search(const SearchRequest& request);
   StoreStat Stat();
   /// The number of changes that are not committed yet.
@@ -52,6 +53,7 @@ class Index {
   void Close();
 
  private:
+  /// kRead and kWrite have a job; kCommit is answered once a commit after it is on the disk.
   enum class Kind { kRead, kWrite, kCommit };
   /// One call of Write, Read or Commit; on the stack of its caller, who waits until it is done.
   struct Task {
@@ -61,6 +63,7 @@ class Index {
     bool done = false;           ///< guarded by mutex_
   };
 
+  /// Queues a task and waits until it is done.
   void Submit(Kind kind, const Job* job);
   void ThreadMain();
   std::deque<Task*> WaitForTasks();

@@ -31,11 +31,13 @@ int32_t KindOfExtension(const std::string& ext) {
   return static_cast<int32_t>(fileindex::GetFileTypeByFullPath("." + ext));
 }
 
+/// The expression for a part of a name; "" for fewer than three characters.
 std::string GramExpression(const std::string& text) {
   const std::vector<std::string> grams = Trigrams(text, kGramsMax);
   return grams.empty() ? std::string() : "{grams} : " + PhraseExpression(grams, false);
 }
 
+/// Joins full-text expressions, of which either may be "".
 void AppendOr(std::string& expression, const std::string& alternative) {
   if (alternative.empty()) return;
   if (!expression.empty()) expression += " OR ";
@@ -112,6 +114,8 @@ DocSet QueryEvaluator::AllDocuments() {
   return found;
 }
 
+/// All documents for which a condition on a column holds, by an index of the table. Extensions are looked for with the
+/// kind that has them and among folders, since their index is by kind first.
 DocSet QueryEvaluator::EvaluateFilter(const QueryNode& node) {
   DocSet found;
   const auto collect = [&found](Statement& statement) {
@@ -165,6 +169,7 @@ void QueryEvaluator::ApplyFilter(DocSet& documents, const QueryNode& filter, boo
   for (const int64_t id : failing) documents.Remove(id);
 }
 
+/// The same condition for one document, by its row.
 bool QueryEvaluator::MatchesFilter(int64_t id, const QueryNode& filter) {
   Statement statement = database_.Prepare("SELECT kind, ext, size, mtime, path FROM docs WHERE id = ?1");
   statement.Bind(1, id);
@@ -214,6 +219,7 @@ void QueryEvaluator::CollectWords(const QueryNode& node, HitCollector& content, 
   if (!meta_expression.empty()) Collect(database_, "meta_fts", meta_expression, words.prefix, meta);
 }
 
+/// The documents with these words; with `ranking` also their hits, what they weigh, and what snippets mark.
 DocSet QueryEvaluator::EvaluateWords(const QueryNode& node, bool ranking) {
   HitCollector content(hits_max_);
   HitCollector meta(hits_max_);

@@ -28,6 +28,8 @@ Registry::Registry(const std::string& state_folder) : table_(state_folder + "/in
 
 Registry::~Registry() = default;
 
+/// Opens the store, or makes it with `create`, when the index is not open already. What the index calls on damage only
+/// sets flags: it may hold locks of its own, and HealDamaged does the rest once the request is answered.
 void Registry::OpenSlot(IndexSlot& slot, const std::string& path, bool create) {
   if (slot.index != nullptr) return;
   auto store = std::make_unique<SqliteStore>(IndexFile(path), create, slot.schema);
@@ -38,6 +40,7 @@ void Registry::OpenSlot(IndexSlot& slot, const std::string& path, bool create) {
                                        });
 }
 
+/// Commits and closes; searches that run finish first.
 void Registry::CloseSlot(IndexSlot& slot) {
   if (slot.index == nullptr) return;
   slot.index->Close();
@@ -88,6 +91,7 @@ void Registry::MakeAnew(const std::string& id, const std::string& path, IndexSlo
   FinishMaking(id, path, slot);
 }
 
+/// Makes the new file. Also the first thing that is done for an index whose engine died before it got that far.
 void Registry::FinishMaking(const std::string& id, const std::string& path, IndexSlot& slot) {
   MakeIndexFolder(path);
   OpenSlot(slot, path, true);
@@ -167,6 +171,7 @@ void Registry::Create(const std::string& id, const std::string& path, const Json
   table_.Add(id, record);
 }
 
+/// The slot's mutex is held until the list says "paused": a request in between would open the index again.
 void Registry::Pause(const std::string& id) {
   const base::MutexLock change(change_mutex_);
   const std::shared_ptr<IndexSlot> slot = table_.Find(id).slot;
@@ -185,6 +190,7 @@ void Registry::SetPaused(const std::string& id, bool paused) {
   table_.Apply(id, [paused](IndexRecord& record) { record.paused = paused; });
 }
 
+/// The list forgets the index first, so that no request opens it while its files go.
 void Registry::Delete(const std::string& id) {
   const base::MutexLock change(change_mutex_);
   const IndexRecord record = table_.Find(id);
@@ -195,6 +201,8 @@ void Registry::Delete(const std::string& id) {
   RemoveIndexFiles(record.path);
 }
 
+/// The list notes where the index goes, the files are moved, the list notes that they are there. An engine that dies in
+/// between finds the note, and by the files how far it got.
 void Registry::Move(const std::string& id, const std::string& new_id, const std::string& new_path) {
   const base::MutexLock change(change_mutex_);
   const IndexRecord record = table_.Find(id);

@@ -49,13 +49,14 @@ class Schema {
   /// Whether the field holds a number that ranges are asked for.
   static bool IsRanged(const std::string& name);
 
+  /// As they were given.
   const Json::Value& Mappings() const { return mappings_; }
 
  private:
   enum class Type { kAny, kText, kInt, kDouble, kBool };
   struct Field {
     Type type = Type::kAny;
-    bool plain = true;
+    bool plain = true;  ///< "_all"
   };
   static Field ReadField(const std::string& name, const Json::Value& attributes, const Field& defaults);
 

@@ -34,8 +34,9 @@ class Statement {
   Statement& operator=(const Statement&) = delete;
   ~Statement();
 
+  // Each returns the statement, so that calls are chained. @throws Error kEngineStorage.
   Statement& Bind(int index, int64_t value);
-  Statement& Bind(int index, double value) = delete;
+  Statement& Bind(int index, double value) = delete;  // a size or count would lose its last digits unnoticed
   Statement& Bind(int index, std::string_view text);
   Statement& BindBlob(int index, std::string_view bytes);
   Statement& BindNull(int index);
@@ -46,8 +47,10 @@ class Statement {
   bool Step();
   /// Runs a statement that returns no rows, and makes it ready for other parameters.
   void Run();
+  /// Makes it ready for other parameters before its rows are all read.
   void Reset();
 
+  // The row at hand, after a Step that returned true.
   int64_t Int(int column) const { return sqlite3_column_int64(statement_, column); }
   bool IsNull(int column) const { return sqlite3_column_type(statement_, column) == SQLITE_NULL; }
   /// Valid until the next step.
@@ -77,15 +80,18 @@ class Database {
   Statement Prepare(const char* sql);
   /// The same for a text that is built at run time.
   Statement Prepare(const std::string& sql);
+  /// Runs statements without parameters, which are not kept.
   void Execute(const char* sql);
   void Execute(const std::string& sql) { Execute(sql.c_str()); }
   /// The first column of the first row; 0 when there is none.
   int64_t QueryInt(const char* sql);
 
+  /// For what has no member here; its results go to Check.
   sqlite3* Handle() { return handle_.get(); }
   const std::string& Path() const { return path_; }
   /// Logs and throws what the last call's result means for the index; IndexDamaged where that is it.
   [[noreturn]] void Fail(int result);
+  /// Fails unless the call that returned `result` succeeded.
   void Check(int result) {
     if (result != SQLITE_OK) [[unlikely]]
       Fail(result);
@@ -101,6 +107,7 @@ class Database {
 
   std::string path_;
   std::unique_ptr<sqlite3, Closer> handle_;
+  /// By their text. A text must not be prepared again while its rows are read: it would be the same statement.
   std::unordered_map<std::string, std::unique_ptr<sqlite3_stmt, Finalizer>> statements_;
 };
 

@@ -41,15 +41,19 @@ class SqliteStore : public IndexStore {
   void LimitPages(int64_t pages);
 
  private:
+  /// Opens the transaction that the changes until the next commit share.
   void Begin();
   void ShortenLog();
 
+  // What changes a document's row; its words go to texts_.
   int64_t InsertRow(const DocRow& row, int64_t text_bytes);
   void UpdateRow(int64_t id, const DocRow& row, int64_t text_bytes);
   void Remove(const StoredDocument& stored);
   void RemoveAt(const std::string& path);
+  /// Keeps the sums, for a text that had `before` bytes and has `after` now.
   void CountText(int64_t before, int64_t after);
   void Changed(int64_t bytes);
+  /// A document as Get returns it, with the changes that are not committed.
   Json::Value LoadEntry(const StoredDocument& stored, const std::vector<std::string>& fields);
 
   const std::shared_ptr<const Schema> schema_;
@@ -58,9 +62,9 @@ class SqliteStore : public IndexStore {
   FieldNames names_;
   FileLinks links_{writer_, names_};
   TextWriter texts_{writer_, names_, schema_};
-  Totals totals_;  ///< with the changes of the open transaction
-  int64_t uncommitted_bytes_ = 0;
-  bool in_transaction_ = false;
+  Totals totals_;                  ///< with the changes of the open transaction
+  int64_t uncommitted_bytes_ = 0;  ///< for the automatic commit: texts, and a fixed amount for each change
+  bool in_transaction_ = false;    ///< since the first change after a commit
 
   ReaderPool readers_;  ///< for Search and Stat, on any thread
 };

@@ -19,12 +19,14 @@ class TextCodec {
   std::string_view Unpack(std::string_view packed);
 
  private:
+  /// For the library's contexts.
   struct Freer {
     void operator()(ZSTD_CCtx* context) const { (void)ZSTD_freeCCtx(context); }
     void operator()(ZSTD_DCtx* context) const { (void)ZSTD_freeDCtx(context); }
   };
   std::unique_ptr<ZSTD_CCtx, Freer> packer_;
   std::unique_ptr<ZSTD_DCtx, Freer> unpacker_;
+  // What the views that were returned last point into.
   std::string packed_;
   std::string text_;
 };

@@ -41,7 +41,8 @@ class WordScanner {
   void Append(std::string_view folded);
 
   std::string_view text_;
-  size_t pos_ = 0;
+  size_t pos_ = 0;  ///< what is to be read next
+  // The present word and its place.
   std::array<char, kWordMaxBytes> word_;
   size_t word_size_ = 0;
   std::string piece_;     ///< the folded character at hand

@@ -12,9 +12,11 @@ namespace ferrox::extract {
 /// more was read, or more time spent, than tags can take: the library searches a whole damaged file for sound.
 class AudioStream : public TagLib::IOStream {
  public:
+  /// The bytes from `begin` to before `end`; `name` is one whose extension tells the library the format.
   AudioStream(const Source& source, uint64_t begin, uint64_t end, std::string name);
 
   TagLib::FileName name() const override { return name_.c_str(); }
+  /// Fewer bytes than asked for at the end, and none once a limit is reached.
   TagLib::ByteVector readBlock(unsigned long length) override;
   void seek(long offset, Position from) override;
   long tell() const override { return at_; }
@@ -22,6 +24,7 @@ class AudioStream : public TagLib::IOStream {
   bool readOnly() const override { return true; }
   bool isOpen() const override { return true; }
 
+  // What a stream for reading does not do.
   void writeBlock(const TagLib::ByteVector&) override {}
   void insert(const TagLib::ByteVector&, unsigned long, unsigned long) override {}
   void removeBlock(unsigned long, unsigned long) override {}
@@ -29,8 +32,8 @@ class AudioStream : public TagLib::IOStream {
 
  private:
   FileBytes file_;
-  uint64_t begin_;
-  long length_;  ///< the library counts in long, so that on 32 bits a file ends at 2 GiB
+  uint64_t begin_;  ///< place 0 of the stream, in the file
+  long length_;     ///< the library counts in long, so that on 32 bits a file ends at 2 GiB
   long at_ = 0;
   long read_ = 0;  ///< in all
   CpuBudget budget_;

@@ -6,7 +6,8 @@
 
 namespace ferrox::extract {
 
-/// A number in `bytes`, high byte first; 0 where it is not wholly inside.
+/// A number of up to 8 bytes in `bytes`, high byte first; 0 where it is not wholly inside, so that a reader of a
+/// damaged file needs no check of its own before each number.
 inline uint64_t BigEndian(std::string_view bytes, size_t at, size_t size) {
   if (at > bytes.size() || bytes.size() - at < size) return 0;
   uint64_t value = 0;

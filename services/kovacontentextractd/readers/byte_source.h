@@ -33,14 +33,15 @@ class FileBytes {
   std::string ReadAt(uint64_t offset, size_t room) const;
 
  private:
-  int fd_;
-  uint64_t size_;
+  int fd_;         ///< the caller's
+  uint64_t size_;  ///< when the reading began
 };
 
 /// A file from its beginning.
 class FileSource : public ByteSource {
  public:
   explicit FileSource(const Source& source) : bytes_(source) {}
+  /// Reads on; does not move the descriptor's position.
   size_t Read(char* buffer, size_t room) override;
   /// Passes `count` bytes without reading them.
   void Skip(uint64_t count) { at_ += std::min(count, bytes_.Size() - std::min(at_, bytes_.Size())); }

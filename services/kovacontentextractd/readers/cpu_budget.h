@@ -11,9 +11,11 @@ namespace ferrox::extract {
 class CpuBudget {
  public:
   explicit CpuBudget(std::chrono::milliseconds budget) : end_(Used() + budget) {}
+  /// Asks the kernel, so not for every byte.
   bool IsSpent() const { return Used() > end_; }
 
  private:
+  /// By this process since its start.
   static std::chrono::nanoseconds Used() {
     timespec used = {};
     (void)clock_gettime(CLOCK_PROCESS_CPUTIME_ID, &used);

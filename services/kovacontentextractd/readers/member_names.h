@@ -21,14 +21,14 @@ class MemberNames {
 
  private:
   struct Name {
-    std::string bytes;
-    std::string otherwise;
+    std::string bytes;      ///< as the archive has it, until DecodeOld
+    std::string otherwise;  ///< see Add; "" for a name in UTF-8
   };
   void DecodeOld();
 
   Findings& findings_;
   std::vector<Name> names_;
-  size_t bytes_ = 0;
+  size_t bytes_ = 0;  ///< of all names
 };
 
 /// The encoding of names that are not UTF-8, each ending a line; empty when they look Western.

@@ -26,10 +26,12 @@ class XmlTokenizer {
   };
   static constexpr int kDepthMax = 256;
 
+  /// `source` must outlive this; it is read as tokens are asked for.
   explicit XmlTokenizer(ByteSource& source);
   XmlTokenizer(const XmlTokenizer&) = delete;
   XmlTokenizer& operator=(const XmlTokenizer&) = delete;
 
+  /// Goes to the next token. After kEnd and kBad, the same again.
   Token Next();
   /// The same for a loop: false at the end, and where it is bad.
   bool Next(Token& token);
@@ -38,11 +40,13 @@ class XmlTokenizer {
 
   /// Without its prefix. Valid, as all that follows, until the next call of Next.
   std::string_view Name() const { return LocalName(name_); }
+  /// A piece of text, with references resolved.
   std::string_view Text() const { return text_; }
   /// By the whole name, with its prefix; empty when there is none.
   std::string_view Attribute(std::string_view name) const;
   /// By the name behind any prefix, but only of those that have one.
   std::string_view PrefixedAttribute(std::string_view local_name) const;
+  /// How many elements are open.
   int Depth() const { return depth_; }
 
  private:
@@ -77,19 +81,19 @@ class XmlTokenizer {
 
   ByteSource& source_;
   Charset charset_ = Charset::kUnknown;
-  std::array<char, 16384> buffer_;
-  std::array<char, 4096> wide_;  ///< UTF-16 that is not converted yet
+  std::array<char, 16384> buffer_;  ///< UTF-8; what is unread lies from begin_ to end_
+  std::array<char, 4096> wide_;     ///< UTF-16 that is not converted yet
   size_t wide_size_ = 0;
   size_t begin_ = 0, end_ = 0;
   bool source_ended_ = false;
-  bool in_cdata_ = false;
+  bool in_cdata_ = false;       ///< within "<![CDATA[", of which the end is to come
   bool close_pending_ = false;  ///< behind an empty element
   bool bad_ = false;
   int depth_ = 0;
-  std::string name_;
+  std::string name_;  ///< with its prefix, of the element that begins or ends
   std::vector<NamedValue> attributes_;
   size_t attribute_count_ = 0;  ///< of attributes_: the others keep their memory
-  std::string reference_;
+  std::string reference_;       ///< the character that text_ is, when it was a reference
   std::string_view text_;
 };
 

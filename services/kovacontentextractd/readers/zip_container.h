@@ -47,7 +47,7 @@ class ZipContainer {
   bool Spend(uint64_t bytes);
 
   Findings& findings_;
-  uint64_t file_bytes_;
+  uint64_t file_bytes_;          ///< of the whole container
   uint64_t packed_bytes_ = 0;    ///< of the members opened so far
   uint64_t unpacked_bytes_ = 0;  ///< of what was read of them
   bool exhausted_ = false;
