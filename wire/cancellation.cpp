@@ -4,6 +4,7 @@
 
 namespace ferrox::wire {
 
+/// Does not wait for the waits to end: they do so on their own threads.
 void Cancellation::Cancel() {
   const base::MutexLock lock(mutex_);
   cancelled_ = true;

@@ -10,12 +10,17 @@ namespace {
 
 namespace field = fileindex::elastic;
 
+// Members of an object are written in the order of the alphabet, whatever the order in which they are set here: the
+// same request is the same text.
+
+/// An object with one member.
 Json::Value Object(const char* key, Json::Value value) {
   Json::Value object(Json::objectValue);
   object[key] = std::move(value);
   return object;
 }
 
+/// A command on one document.
 Json::Value DocumentRequest(const char* command, const std::string& index_id, const Json::Value& doc_id) {
   Json::Value request = IndexRequest(command, index_id);
   request["data"]["doc_id"] = doc_id;
@@ -45,6 +50,7 @@ Json::Value CreateIndexRequest(const std::string& index_id, const std::string& d
   return request;
 }
 
+/// What is to change has an object of its own, so that a new id is not taken for that of the index.
 Json::Value ConfigureIndexRequest(const std::string& index_id, const std::string& new_id, const std::string& db_path) {
   Json::Value request = IndexRequest("index_config_set", index_id);
   Json::Value& changes = request["data"]["data"];
@@ -80,6 +86,7 @@ Json::Value DeleteDocumentRequest(const std::string& index_id, const std::string
   return DocumentRequest("document_del_by_id", index_id, path);
 }
 
+/// The slash keeps out the folder itself, and its neighbours whose names begin with its own.
 Json::Value AllBelow(const std::string& folder) { return Object("prefix", Object(field::kKOVAMDPath, folder + "/")); }
 
 Json::Value OnlyAt(const std::string& path) { return Object("term", Object(field::kKOVAMDPath, path)); }
@@ -96,6 +103,7 @@ Json::Value DeleteDocumentsRequest(const std::string& index_id, Json::Value whic
   return request;
 }
 
+/// What has its default is left out: the engine's defaults are those of DocumentQuery.
 Json::Value FindDocumentsRequest(const std::string& index_id, DocumentQuery query) {
   Json::Value request = IndexRequest("document_get_by_query", index_id);
   Json::Value& sent = request["data"]["query"];

@@ -3,6 +3,16 @@
 /// The names of the document fields that content extraction fills and the search engine stores, one constant each: the
 /// field "KOVAMDPath" is kKOVAMDPath, "_KOVAMDUserTags" is k_KOVAMDUserTags. Stored documents use them: a name never
 /// changes, odd as some are ("KOVAMDContactKeyworlds", "KOVAMDRecodingDate", "KOVAStateOrProvince").
+///
+/// Who uses a field's name takes it from here, so that a name that is spelt wrong does not compile. The types of the
+/// fields, and how they are searched, are those of the index's mappings (elastic::GetFileIndexMappings). What the names
+/// of whole families tell:
+///
+///   KOVAMDFS...          facts about the file that need no look into it: size, dates, name
+///   KOVAMDPath, -Parent  where it lies; the document's id is its path
+///   KOVAMD...            what was read from its content; each reader fills those that its format has
+///   _KOVAMD...           of the desktop's tags and labels
+///   _KOVA...             for programs, below; nobody searches them
 namespace ferrox::fileindex::elastic {
 
 // clang-format off
@@ -37,6 +47,7 @@ namespace ferrox::fileindex::elastic {
   X(KOVAMDDateAdded) X(KOVAMDPeopleDisplayName)
 // clang-format on
 
+// One constant a field, and below all of them in one list.
 #define FERROX_DEFINE_FIELD(name) inline constexpr char k##name[] = #name;
 FERROX_FIELD_NAMES(FERROX_DEFINE_FIELD)
 #undef FERROX_DEFINE_FIELD
@@ -45,7 +56,7 @@ FERROX_FIELD_NAMES(FERROX_DEFINE_FIELD)
 inline constexpr const char* kFieldNames[] = {FERROX_FIELD_NAMES(FERROX_LIST_FIELD)};
 #undef FERROX_LIST_FIELD
 
-// Members of stored documents that are for programs and no fields of the schema: nobody searches them.
+// Members of stored documents that are for programs: they are no fields of the schema, and not in kFieldNames.
 inline constexpr char k_KOVAStamp[] = "_KOVAStamp";        ///< text: differs when size, times or inode do; ends in the
                                                            ///< last "." and the inode's number
 inline constexpr char k_KOVANeedMeta[] = "_KOVANeedMeta";  ///< bool: the content was wanted when it was written
@@ -54,7 +65,8 @@ inline constexpr char k_KOVAExtractError[] = "_KOVAExtractError";  ///< text: wh
 inline constexpr char k_KOVATextCut[] = "_KOVATextCut";            ///< bool: there was more text than is kept
 inline constexpr char k_KOVATextEncoding[] = "_KOVATextEncoding";  ///< text: of the file's bytes, for people
 
-// The settings of content extraction.
+// The settings of content extraction. The library itself sends the first; the others are for programs that were built
+// with them.
 inline constexpr char kNeedMeta[] = "need_meta";  ///< in the configuration: whether the content is read, too
 inline constexpr char kCfg[] = "cfg";
 inline constexpr char kPath[] = "path";

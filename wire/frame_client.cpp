@@ -12,7 +12,9 @@ namespace ferrox::wire {
 
 namespace {
 
+/// The engine's own limit of a request; no other daemon takes or sends as much.
 constexpr uint32_t kMessageMaxBytes = 256U << 20;
+/// A daemon that takes nothing for a minute is given up, however long its answer may take.
 constexpr int kSendIdleMs = 60000;
 
 /// Only a socket that is missing or that nobody serves is that of a daemon that does not run.
@@ -27,6 +29,7 @@ Outcome WhyCutShort(int error) {
   return error == EMSGSIZE ? Outcome::kUnreadable : Outcome::kPeerClosed;
 }
 
+/// One request and its reply, up to the first step that fails.
 Outcome Exchange(FrameClient& client, const std::string& request, std::string& reply,
                  std::chrono::milliseconds longest) {
   Outcome outcome = client.Connect();
@@ -68,6 +71,7 @@ Outcome FrameClient::Connect() {
   return socket_.Valid() ? Outcome::kAnswered : WhyNotConnected(errno);
 }
 
+// Each wait is reported (SocketWaits), so that a Cancellation of this thread can end it.
 Outcome FrameClient::Send(const std::string& message) {
   const kovadaemon::SocketWait wait(socket_.Get());
   if (base::SendFrame(socket_.Get(), message, kMessageMaxBytes, kSendIdleMs)) return Outcome::kAnswered;
@@ -85,6 +89,7 @@ Reply AskEngine(const Json::Value& request, std::chrono::milliseconds longest) {
   return Ask(kElasticdSocket, toString(request), longest);
 }
 
+/// The library's own sender ends its text with the zero byte of a C string, and the daemons read both alike.
 Reply AskDaemon(const char* socket, const std::string& type, const Json::Value& data,
                 std::chrono::milliseconds longest) {
   Json::Value request;
@@ -93,6 +98,7 @@ Reply AskDaemon(const char* socket, const std::string& type, const Json::Value& 
   return Ask(socket, toString(request) + '\0', longest);
 }
 
+/// The connection is closed without a request, which costs the daemon nothing.
 bool IsServed(const std::string& socket_path) { return FrameClient(socket_path).Connect() != Outcome::kNotRunning; }
 
 }  // namespace ferrox::wire

@@ -118,6 +118,8 @@ void ShareIndexRename(const std::string& share_from, const std::string& share_to
   SendRequest(wire::ConfigureIndexRequest(GetFileIndexID(share_from), GetFileIndexID(share_to), db_path));
 }
 
+// The document is built before anything is sent, by reading the file in this thread: what cannot be read changes
+// nothing.
 void IndexUpsert(const std::string& share, const std::string& path, bool need_meta) {
   SendRequest(wire::UpsertDocumentRequest(GetFileIndexID(share), path, BuildDocument(path, need_meta)));
 }
@@ -134,6 +136,8 @@ void IndexDelDir(const std::string& share, const std::string& dir) {
   SendRequest(wire::DeleteDocumentsRequest(GetFileIndexID(share), wire::AllBelow(dir)));
 }
 
+/// Three requests: the document itself, then all paths below the old place in one reply, then their moves in one
+/// compound. What comes below the old place between the last two stays there until its own event is handled.
 void IndexRename(const std::string& share, const std::string& new_path, const std::string& old_path) {
   const std::string index_id = GetFileIndexID(share);
   Json::Value res;
@@ -151,6 +155,8 @@ void IndexGetByPrefixPath(const std::string& index_id, const std::string& prefix
   }
 }
 
+/// A commit that fails while the volume is full is reported as that, whatever the engine called it. What was sent since
+/// the last commit may be lost, so the share is marked: it is reindexed once there is room.
 void IndexCommit(const std::string& share_name) {
   try {
     SendRequest(wire::IndexRequest("commit", GetFileIndexID(share_name)));

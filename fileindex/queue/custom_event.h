@@ -10,9 +10,10 @@ namespace ferrox::fileindex {
 
 class QueuedReindexes;
 
-/// Queues events one after the other, each as AddCustomEvent does; but what a queue held when its first event came is
-/// read only once, not once for each event. All events of one writer tell of changes that were made before its first:
-/// a reindex that waited then will see them all.
+/// For operations that queue many events, such as a list of folders to reindex: queues events one after the other, each
+/// as AddCustomEvent does; but what a queue held when its first event came is read only once, not once for each event.
+/// All events of one writer tell of changes that were made before its first: a reindex that waited then will see them
+/// all.
 class CustomEventWriter {
  public:
   CustomEventWriter();
@@ -24,7 +25,7 @@ class CustomEventWriter {
   void Add(int event, const std::string& path, const std::string& path_old, const Json::Value& data);
 
  private:
-  std::map<std::string, std::unique_ptr<QueuedReindexes>> queues_;  // by the queue's path
+  std::map<std::string, std::unique_ptr<QueuedReindexes>> queues_;  ///< by the queue's path
 };
 
 }  // namespace ferrox::fileindex

@@ -13,6 +13,7 @@ namespace ferrox::fileindex {
 
 namespace {
 
+/// Of the platform's paths, with their zero byte.
 constexpr size_t kPathBytes = 4096;
 
 }  // namespace
@@ -21,6 +22,7 @@ std::string DetachedQueuePath(const std::string& queue_path) { return queue_path
 
 std::string AppliedFoldersPath(const std::string& queue_path) { return queue_path + ".folders"; }
 
+/// Under the process's mutex of the platform's share calls, which must not run at the same time.
 std::string ComposeQueuePath(const std::string& share_path) {
   const LockMutex guard(sdk::SDKMutex());
   char path[kPathBytes] = {};
@@ -45,6 +47,8 @@ std::unique_ptr<LockedQueue> LockedQueue::Try(const std::string& queue_path) {
   return std::unique_ptr<LockedQueue>(new LockedQueue(queue_path, std::move(lock)));
 }
 
+/// By the path and not by the lock's descriptor, which is open for reading alone; while the lock is held, both are one
+/// file.
 bool LockedQueue::Append(std::string_view lines) const { return AppendLines(queue_path_, lines); }
 
 }  // namespace ferrox::fileindex

@@ -13,6 +13,7 @@ namespace {
 /// What JSON does not allow in a text as it is. Bytes above 0x7f stay, be they UTF-8 or not.
 bool NeedsEscape(char c) { return static_cast<unsigned char>(c) < 0x20 || c == '"' || c == '\\'; }
 
+/// A control character always by its number: readers take "\u000a" as well as "\n", and one form is less code.
 void AppendEscaped(std::string& text, char c) {
   constexpr char kHex[] = "0123456789abcdef";
   text += '\\';
