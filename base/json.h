@@ -5,6 +5,7 @@
 
 #include <json/forwards.h>
 
+/// The one way in which JSON is parsed in this system, for files and messages alike.
 namespace base {
 
 /// What is read besides the JSON that all accept. None takes comments (but for the few places where the JSON library

@@ -8,7 +8,12 @@
 #include "base/thread_annotations.h"
 
 /// The standard library's mutexes with what they guard told to the compiler (thread_annotations.h). Members that a
-/// mutex guards are declared with BASE_GUARDED_BY.
+/// mutex guards are declared with BASE_GUARDED_BY, functions that expect it held with BASE_REQUIRES; clang then refuses
+/// code that touches the one or calls the other without it:
+///   base::Mutex mutex_;
+///   size_t count_ BASE_GUARDED_BY(mutex_) = 0;
+///   void Add() { const base::MutexLock lock(mutex_); ++count_; }
+/// All of them must outlive the threads that use them.
 namespace base {
 
 /// Not recursive. Lock blocks until the mutex is free.
@@ -19,6 +24,7 @@ class BASE_CAPABILITY("mutex") Mutex {
   Mutex& operator=(const Mutex&) = delete;
 
   void Lock() BASE_ACQUIRE() { mutex_.lock(); }
+  /// Takes the mutex if it is free. Does not block. @return whether it is held now.
   bool TryLock() BASE_TRY_ACQUIRE(true) { return mutex_.try_lock(); }
   void Unlock() BASE_RELEASE() { mutex_.unlock(); }
 
@@ -77,6 +83,7 @@ class ConditionVariable {
     return WaitUntil(mutex, std::chrono::steady_clock::now() + duration);
   }
 
+  /// Wake one waiting thread, or all. The mutex need not be held; what was changed must have been changed under it.
   void NotifyOne() { condition_.notify_one(); }
   void NotifyAll() { condition_.notify_all(); }
 
@@ -84,7 +91,7 @@ class ConditionVariable {
   std::condition_variable condition_;
 };
 
-/// Held by any number of readers or by one writer.
+/// Held by any number of readers or by one writer. Not recursive: a reader must not become the writer.
 class BASE_CAPABILITY("shared mutex") SharedMutex {
  public:
   SharedMutex() = default;

@@ -12,12 +12,15 @@
 
 namespace base {
 
-/// Values by full path, found from any path at or below theirs. Each name of a path is hashed once: the hash of a path
-/// goes on from that of the folder above it, so that a path costs what its bytes cost, however deep it is.
+/// Values by full path, found from any path at or below theirs: "which of these folders holds this file". Each name of
+/// a path is hashed once: the hash of a path goes on from that of the folder above it, so that a path costs what its
+/// bytes cost, however deep it is and however many values there are. Belongs to one thread at a time.
+///
+/// Paths are absolute and in their plain form. "" is above all of them; "/" is a name like others and above none.
 template <typename Value, typename NameHash = std::hash<std::string_view>>
 class PathTable {
  public:
-  /// Keeps the value that is there already.
+  /// Adds a value; keeps the one that is at that path already.
   void Insert(std::string_view full_path, Value value) {
     longest_ = std::max(longest_, full_path.size());
     const KeyView key = KeyOf(full_path);
@@ -25,10 +28,12 @@ class PathTable {
       (void)values_.try_emplace(Key{std::string(full_path), key.hash}, std::move(value));
     }
   }
+  /// Removes the value of exactly that path, if there is one.
   void Erase(std::string_view full_path) {
     const auto found = values_.find(KeyOf(full_path));
     if (found != values_.end()) values_.erase(found);
   }
+  /// Removes each value for which `predicate` is true. Linear in the number of values.
   template <typename Predicate>
   void EraseIf(const Predicate& predicate) {
     (void)std::erase_if(values_, [&predicate](const auto& entry) { return predicate(entry.second); });
@@ -42,6 +47,7 @@ class PathTable {
     return found != values_.end() ? &found->second : nullptr;
   }
 
+  /// Whether the path, or a folder above it, has a value.
   bool HasAtOrAbove(std::string_view path) const {
     bool has = false;
     VisitUpwards(path, [&has](const Value&) { return has = true; });

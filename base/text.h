@@ -8,6 +8,7 @@
 /// Texts in UTF-8, and what of them may be shown as it is: names and contents are bytes that somebody else has chosen.
 namespace base {
 
+/// As Unicode defines it: no overlong forms, no surrogates, nothing beyond U+10FFFF.
 /// The number of bytes of the UTF-8 character that `text` begins with, 0 when it begins with none.
 inline size_t CharacterBytes(std::string_view text) {
   if (text.empty()) return 0;
@@ -27,7 +28,8 @@ inline size_t CharacterBytes(std::string_view text) {
 }
 
 /// The code point of a character that is a control, whether a terminal obeys it (C0, DEL, the C1 controls, the breaks
-/// of lines and paragraphs) or it turns the direction of what stands around it; -1 for any other character.
+/// of lines and paragraphs) or it turns the direction of what stands around it, so that a name can look like another;
+/// -1 for any other character. `character` is one whole UTF-8 character.
 inline int ControlCodePoint(std::string_view character) {
   const auto low = [&character](size_t at) { return character[at] & 0x3F; };
   const auto first = static_cast<unsigned char>(character[0]);
@@ -40,7 +42,8 @@ inline int ControlCodePoint(std::string_view character) {
 }
 
 /// The text with each byte of a control, and each that is not part of valid UTF-8, in the form of `format`, that takes
-/// an unsigned number; controls that are in `kept` stay.
+/// an unsigned number ("\\x%02x"; at most 7 bytes); controls that are in `kept` (UTF-8) stay. The result is valid
+/// UTF-8.
 inline std::string WithoutControls(std::string_view text, const char* format, std::string_view kept = {}) {
   std::string out;
   out.reserve(text.size());

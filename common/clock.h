@@ -7,7 +7,8 @@
 
 namespace ferrox {
 
-/// Time and sleep, so that a test can own both. One per process, replaced only by tests.
+/// Time and sleep. All of the library asks the process's one clock, so that a test can decide what time it is and what
+/// a wait costs, and a daemon can make waits end early. Its functions are called by several threads at once.
 class FERROX_EXPORT Clock {
  public:
   Clock() = default;
@@ -15,10 +16,12 @@ class FERROX_EXPORT Clock {
   Clock& operator=(const Clock&) = delete;
   virtual ~Clock();
 
+  /// Blocks the calling thread for `duration`. A replacement may throw to end the work that waits.
   virtual void SleepFor(std::chrono::milliseconds duration);
-  /// Seconds since the epoch.
+  /// Seconds since the epoch, by the host's clock: may jump when that is set.
   virtual int64_t Now();
 
+  /// The present clock. The reference must not be kept over a Set.
   static Clock& Get();
   /// Makes `clock` the process's and returns the one before; null restores the real one. The caller keeps `clock`
   /// alive.

@@ -8,8 +8,9 @@
 
 namespace ferrox {
 
-/// The one exception type. `what()` is the reason alone (empty when none was given); the composed text, code and
-/// reason, is the base class's message: `error.std::runtime_error::what()`.
+/// What the library throws. A failure is thrown after its line is in the log (common/log.h), so that a catch logs
+/// nothing again. `what()` is the reason alone (empty when none was given); the composed text, code and reason, is the
+/// base class's message: `error.std::runtime_error::what()`.
 class FERROX_EXPORT Error : public std::runtime_error {
  public:
   /// The numbers are shared with the search engine's replies and with callers: they never change. An engine may report
@@ -47,12 +48,14 @@ class FERROX_EXPORT Error : public std::runtime_error {
     kTreeInconsistent = 9999,       ///< a path that the operation tree cannot hold
   };
 
+  /// Neither constructor logs; failures that nothing has logged go through Fail (common/log.h).
   explicit Error(ErrorCode code);
   Error(ErrorCode code, const std::string& reason);
   Error(const Error&) = default;
   Error& operator=(const Error&) = default;
   ~Error() override;
 
+  /// The reason alone. Lives as long as the error.
   const char* what() const noexcept override;
   ErrorCode Code() const noexcept { return code_; }
 

@@ -8,10 +8,12 @@
 #include "common/export.h"
 
 /// JSON texts from outside before they are parsed: as a tree, a text of "[0,0,..." takes fifty times its own size.
-/// Nothing here builds any value, or says that a text is valid.
+/// So a request is counted, and cut into its members, before any of it is built. Nothing here says that a text is
+/// valid: of an invalid one the answers are some, but nothing outside of the text is read and no memory is taken for
+/// values. Views point into the text and live as long as that.
 namespace ferrox {
 
-/// How many values a text has at most, members' names not counted.
+/// How many values a text has at most, members' names not counted. Linear in the text, without memory of its own.
 FERROX_EXPORT size_t CountJsonValues(std::string_view text);
 
 struct JsonMember {

@@ -8,6 +8,7 @@
 #include "common/export.h"
 
 /// Typed reading of JSON with uniform error texts, partial updates, and whole-text and whole-file conversion.
+/// May be called by several threads at once for values of their own; parsers and writers are kept per thread.
 /// No exception of the JSON library leaves any of these functions.
 namespace ferrox {
 
@@ -15,9 +16,10 @@ namespace ferrox {
 /// anything else: also for text after the value, nesting deeper than 1000, and comments, except where the JSON library
 /// passes over them: in an object before and behind a member, in an array behind an element.
 FERROX_EXPORT bool fromString(Json::Value& value, const std::string& text);
-/// The value as one line. UTF-8, and any other byte, stays as it is.
+/// The value as one line without a newline. UTF-8, and any other byte, stays as it is.
+/// @throws std::bad_alloc rather than return a part of the text.
 FERROX_EXPORT std::string toString(const Json::Value& value);
-/// Reads a JSON file; false, with `value` null, when it cannot be read or parsed.
+/// Reads a regular JSON file; a FIFO is not waited for. False, with `value` null, when it cannot be read or parsed.
 FERROX_EXPORT bool fromFile(Json::Value& value, const std::string& path);
 /// Writes a JSON file as one line, the old file or the new one at any moment; false, with errno set, on failure.
 FERROX_EXPORT bool toFile(const Json::Value& value, const std::string& path);
@@ -31,7 +33,7 @@ inline bool IsJsonArray(const Json::Value& value) { return value.isArray() || va
 /// long long takes integers only, the others whatever the JSON library converts without loss of range.
 template <typename T>
 bool isJsonType(const Json::Value& value);
-/// Call only where isJsonType holds.
+/// Call only where isJsonType holds: elsewhere the JSON library throws or converts.
 template <typename T>
 T asJsonType(const Json::Value& value);
 

@@ -8,7 +8,8 @@
 
 namespace ferrox {
 
-/// Takes one finished line of the log; `priority` is one of syslog's.
+/// Takes one finished line of the log; `priority` is one of syslog's. Called by any thread, several at once; the line
+/// lives during the call alone. Must not call Log.
 using LogSink = void (*)(int priority, const char* line);
 
 /// Writes one line to the log, the system's unless SetLogSink chose another. `%m` stands for errno's text. Control

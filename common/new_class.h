@@ -5,7 +5,8 @@
 
 namespace ferrox {
 
-/// Makes an object that is shared by design; forwards the arguments to its constructor.
+/// Makes an object that several owners share (events, operations, nodes, folders); object and count are one allocation.
+/// The arguments go to its constructor, whose exceptions pass. The last owner deletes it.
 template <typename T, typename... Args>
 std::shared_ptr<T> newClass(Args&&... args) {
   return std::make_shared<T>(std::forward<Args>(args)...);

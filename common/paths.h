@@ -6,19 +6,23 @@
 
 namespace ferrox {
 
-/// Where a fixed absolute path of the product lies in this instance: the path itself, or below the instance's root.
+/// Where a fixed absolute path of the product lies in this instance: the path itself, or below the instance's root
+/// (FERROX_ROOT, kova/instance.h). The root is read once in the life of a process.
 FERROX_EXPORT std::string InstancePath(const char* fixed_path);
 
-/// The longest path that a socket of this host can have, in bytes.
+/// The longest path that a Unix-domain socket can have, in bytes without the terminating zero. A longer root makes an
+/// instance unusable.
 constexpr size_t kSocketPathMaxBytes = 107;
 
 /// Why this instance's root cannot be used: a sentence with the remedy. Empty when it can.
 FERROX_EXPORT std::string InstanceRootProblem();
 
+/// The daemons' sockets (docs/formats/daemon.md). All of these paths go through InstancePath.
 inline constexpr char kFileIndexdSocket[] = "/var/run/fileindexd.sock";
 inline constexpr char kElasticdSocket[] = "/var/run/kovaelasticd.sock";
 inline constexpr char kNotifydSocket[] = "/var/run/kovanotifyd.sock";
 inline constexpr char kContentExtractdSocket[] = "/var/run/kovacontentextractd.sock";
+/// The indexed folders and the states of indexing; each is written by whoever holds its lock file below.
 inline constexpr char kConfigurationFolder[] = "/var/packages/Ferrox/etc";
 inline constexpr char kFileIndexFoldersCfgPath[] = "/var/packages/Ferrox/etc/fileindex.folders";
 inline constexpr char kFileIndexStatusCfgPath[] = "/var/packages/Ferrox/etc/fileindex.status";

@@ -9,7 +9,9 @@
 namespace ferrox::sdk {
 
 /// Remembers the process's effective user and group and gives them back when the scope ends. The identity is that of
-/// the whole process, not of one thread: keep the scope short.
+/// the whole process, not of one thread: files that other threads open meanwhile are opened as that user, too. Keep the
+/// scope short, and have one at a time. Each call asks the platform under SDKMutex() (common/sdk_mutex.h), which the
+/// caller must not hold; that may block for as long as the host's user database does.
 class FERROX_EXPORT SDKCredentials {
  public:
   /// Remembers only. @throws Error kCredentialsFailed when the present user is unknown to the platform.
@@ -22,7 +24,8 @@ class FERROX_EXPORT SDKCredentials {
   /// foreign identity would be worse. Only logs while another exception is leaving the scope.
   ~SDKCredentials() noexcept(false);
 
-  /// Becomes `user`, or "root" when `user` is an administrator. @throws Error kCredentialsFailed.
+  /// Becomes `user`, or "root" when `user` is an administrator. May be called again for another user.
+  /// @throws Error kCredentialsFailed when the user is unknown or the switch fails; the identity is then as before.
   void AsUser(const std::string& user);
 
  private:

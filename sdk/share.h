@@ -11,8 +11,9 @@ struct KOVAShare;
 
 namespace ferrox::sdk {
 
-/// One shared folder as the platform knows it. Made per use; holds the platform's record while it lives. Every platform
-/// call is made under SDKMutex() unless a function says otherwise, so its caller must not hold that mutex.
+/// One shared folder as the platform knows it. Made per use: the record is read once and is not renewed, the questions
+/// below are asked anew each time and may block for the disk. Every
+/// platform call is made under SDKMutex() unless a function says otherwise, so its caller must not hold that mutex.
 class FERROX_EXPORT SDKShare {
  public:
   /// @throws Error kNoSuchShare, with the name, when there is no such share.
@@ -21,6 +22,7 @@ class FERROX_EXPORT SDKShare {
   SDKShare& operator=(const SDKShare&) = delete;
   ~SDKShare();
 
+  /// The name that it was looked up by. Lives as long as the object.
   const std::string& GetName() const { return share_name_; }
   /// The share's absolute folder, for example "/volume1/photo".
   std::string GetPath() const;

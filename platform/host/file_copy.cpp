@@ -103,7 +103,7 @@ bool Move(const std::string& src, const std::string& dst, bool overwrite) {
 }  // namespace
 
 int KOVAFileCopy(const char* src, const char* dst, const KOVAFileCopyOptions* options, int flag) {
-  (void)flag;  // the appliance's
+  (void)flag;  // no meaning on this host
   if (src == nullptr || dst == nullptr || options == nullptr) return KOVA_FAIL(KOVA_ERR_BAD_PARAMETER);
   const bool overwrite = options->words[0] == 1;
   const bool move = options->words[1] == 1;

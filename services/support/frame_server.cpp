@@ -16,12 +16,12 @@
 #include <cerrno>
 #include <cstring>
 #include <memory>
-#include <mutex>
 #include <optional>
 #include <thread>
 #include <unordered_map>
 #include <vector>
 
+#include "base/mutex.h"
 #include "common/log.h"
 #include "services/support/descriptor_passing.h"
 
@@ -36,9 +36,9 @@ constexpr size_t kReadChunkBytes = 64 * 1024;
 constexpr uint64_t kListenId = 0;
 constexpr uint64_t kStopId = 1;
 constexpr uint64_t kFirstConnectionId = 2;
-constexpr size_t kLargeBytes = 8U << 20;
-constexpr int kTickMs = 1000;
-constexpr int kFullMs = 10;
+constexpr size_t kLargeBytes = 8U << 20;  // a request and its reply, beyond which free memory goes back to the kernel
+constexpr int kTickMs = 1000;             // between two looks for idle connections
+constexpr int kFullMs = 10;               // the pause when the process has no descriptor left
 
 sockaddr_un AddressOf(const std::string& path) {
   sockaddr_un address = {};
@@ -49,7 +49,8 @@ sockaddr_un AddressOf(const std::string& path) {
   return address;
 }
 
-/// A socket file that nobody serves is left over from a dead process.
+/// Removes the socket file of a process that has died. bind() refuses a path that exists, and no process removes its
+/// socket when it is killed.
 void RemoveStaleSocket(const std::string& path, const sockaddr_un& address) {
   const base::UniqueFd probe(socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0));
   const bool served =
@@ -82,7 +83,8 @@ Peer PeerOf(int fd) {
 enum class Progress { kMore, kComplete, kBroken };
 using Chunk = std::array<char, kReadChunkBytes>;
 
-/// One client: receives a request, has it answered, sends the reply, and so on.
+/// One client and where its present frame stands: a request is received whole, answered, its reply sent whole, and the
+/// next one received.
 struct Connection {
   enum class State { kReceiving, kSending };
 
@@ -173,9 +175,13 @@ struct Connection {
 
 }  // namespace
 
-/// One thread accepts connections and ends those that keep us waiting; the others each take a connection that has
-/// something for us, do what can be done without waiting for the peer, and give it back. So a request is answered by
-/// the thread that has read it.
+/// One thread accepts connections and ends those that have been idle for too long; the workers each take a connection
+/// that can be read or written, do what can be done without waiting for the peer, and give it back. So a request is
+/// answered by the thread that has read it, and a slow peer occupies none.
+///
+/// The workers share one epoll set. EPOLLONESHOT disarms a connection when it is reported to one of them, so that no
+/// other gets it until Give arms it again. A connection is known by a number that is never used twice, since its
+/// descriptor may be a new connection's by the time that a worker hears of the old one.
 class FrameServer::Impl {
  public:
   Impl(FrameServerOptions options, Handler handler)
@@ -214,7 +220,7 @@ class FrameServer::Impl {
   void Stop() {
     stop_ = true;
     const uint64_t one = 1;
-    (void)!write(stopped_.Get(), &one, sizeof(one));  // nobody reads it, so that all threads hear of it
+    (void)!write(stopped_.Get(), &one, sizeof(one));  // never read: it stays readable and wakes every thread
   }
 
  private:
@@ -228,9 +234,9 @@ class FrameServer::Impl {
     (void)epoll_ctl(epoll.Get(), operation, fd, &event);
   }
 
-  /// Without connections nothing can time out, and an idle daemon sleeps.
+  /// How long the accepting thread may sleep. Without connections nothing can time out, and it is not woken at all.
   int TimeoutMs() {
-    const std::lock_guard guard(mutex_);
+    const base::MutexLock lock(mutex_);
     return connections_.empty() ? -1 : kTickMs;
   }
 
@@ -239,15 +245,16 @@ class FrameServer::Impl {
       base::UniqueFd fd(accept4(listener_.Get(), nullptr, nullptr, SOCK_CLOEXEC | SOCK_NONBLOCK));
       const bool full = !fd.Valid() && (errno == EMFILE || errno == ENFILE);
       if (!fd.Valid() && !full) return;
-      std::unique_lock lock(mutex_);
+      base::MutexLock lock(mutex_);
       const bool room = (!full && connections_.size() < options_.connections_max) || EndLongestIdle();
       if (fd.Valid() && room) Add(std::move(fd));
-      lock.unlock();
-      if (full && !room) return (void)poll(nullptr, 0, kFullMs);  // who waits to be accepted has us called again
+      lock.Unlock();
+      // The listener stays readable: a pause keeps the loop from spinning until a descriptor is free.
+      if (full && !room) return (void)poll(nullptr, 0, kFullMs);
     }
   }
 
-  void Add(base::UniqueFd fd) {
+  void Add(base::UniqueFd fd) BASE_REQUIRES(mutex_) {
     auto connection = std::make_unique<Connection>();
     connection->id = next_id_++;
     connection->peer = PeerOf(fd.Get());
@@ -268,7 +275,7 @@ class FrameServer::Impl {
 
   /// A connection for the calling thread alone; null when it has been ended.
   Connection* Take(uint64_t id) {
-    const std::lock_guard guard(mutex_);
+    const base::MutexLock lock(mutex_);
     const auto it = connections_.find(id);
     if (it == connections_.end()) return nullptr;
     it->second->busy = true;
@@ -276,7 +283,7 @@ class FrameServer::Impl {
   }
 
   void Give(Connection& connection, Next next) {
-    const std::lock_guard guard(mutex_);
+    const base::MutexLock lock(mutex_);
     connection.busy = false;
     if (next == Next::kEnd) {
       End(connection);
@@ -286,7 +293,9 @@ class FrameServer::Impl {
     }
   }
 
-  /// As far as it goes without waiting for the peer.
+  /// Receives, answers and sends as far as it goes without waiting for the peer. The connection is the calling
+  /// thread's.
+  /// @return what the connection waits for next.
   Next Advance(Connection& connection, Chunk& chunk) try {
     if (connection.state == Connection::State::kReceiving) {
       const size_t before = connection.body.size();
@@ -310,7 +319,7 @@ class FrameServer::Impl {
     return Next::kEnd;
   }
 
-  void End(Connection& connection) {
+  void End(Connection& connection) BASE_REQUIRES(mutex_) {
     if (connection.state == Connection::State::kReceiving) request_bytes_ -= connection.body.size();
     if (connection.descriptor.Valid()) options_.on_end(connection.descriptor.Get());
     connections_.erase(connection.id);
@@ -320,15 +329,15 @@ class FrameServer::Impl {
     const auto now = SteadyClock::now();
     if (now < next_idle_check_) return;
     next_idle_check_ = now + std::chrono::milliseconds(kTickMs);
-    const std::lock_guard guard(mutex_);
+    const base::MutexLock lock(mutex_);
     for (auto it = connections_.begin(); it != connections_.end();) {
       Connection& current = *it++->second;
       if (!current.busy && now - current.last_progress > options_.idle_timeout) End(current);
     }
   }
 
-  /// Makes room for a newcomer: the connection that has kept us waiting longest goes. False when all are at work.
-  bool EndLongestIdle() {
+  /// Makes room for a new connection: the one without progress for the longest time goes. False when all are at work.
+  bool EndLongestIdle() BASE_REQUIRES(mutex_) {
     Connection* longest = nullptr;
     for (const auto& [id, connection] : connections_) {
       if (connection->busy) continue;
@@ -347,9 +356,9 @@ class FrameServer::Impl {
   base::UniqueFd stopped_;
   std::atomic<bool> stop_{false};
   std::atomic<uint64_t> request_bytes_{0};  ///< of all requests that are not answered yet
-  std::mutex mutex_;                        ///< of all below; a connection that is busy is its thread's
-  Connections connections_;
-  uint64_t next_id_ = kFirstConnectionId;
+  base::Mutex mutex_;
+  Connections connections_ BASE_GUARDED_BY(mutex_);  ///< what a busy one holds is its thread's alone
+  uint64_t next_id_ BASE_GUARDED_BY(mutex_) = kFirstConnectionId;
   SteadyClock::time_point next_idle_check_;  ///< of the accepting thread alone
 };
 

@@ -12,7 +12,7 @@
 
 namespace ferrox::services {
 
-/// Who asks, as the kernel knows it.
+/// Who asks, as the kernel knew it when the connection was made (SO_PEERCRED): nothing that the peer says itself.
 struct Peer {
   uid_t uid = 0;
   gid_t gid = 0;
@@ -29,19 +29,21 @@ struct FrameServerOptions {
   uint64_t requests_limit_bytes = 256U << 20;
   unsigned connections_max = 256;
   unsigned workers = 4;
-  /// A connection that neither sends nor takes a byte for so long is ended.
+  /// A connection on which no byte moves for this long is ended, between two requests too.
   std::chrono::seconds idle_timeout{60};
   /// Whether a request may bring a descriptor (SCM_RIGHTS) along; else it is closed.
   bool takes_descriptors = false;
   /// Called with the descriptor of a connection when that ends.
   std::function<void(int descriptor)> on_end = [](int) {};
-  /// Called when Run begins to end: what is to hurry the requests that it still waits for.
+  /// Called once when Run begins to end, before it waits for the requests being answered: it may hurry them.
   std::function<void()> on_stop = [] {};
 };
 
 /// Serves requests and replies on a Unix-domain socket, each a 4-byte length in host byte order and that many bytes. A
 /// connection may carry several requests, one after the other. A peer that is silent, slow, announces too much or
-/// leaves early costs its own connection and nothing else.
+/// leaves early costs its own connection and nothing else: memory grows with the bytes received, and when all
+/// connections are taken, or the process has no descriptor left, the one that was idle for the longest time is ended
+/// in favour of the new one.
 class FrameServer {
  public:
   /// Answers one request; called on one of the workers, which has just read it. An exception ends that connection

@@ -21,8 +21,9 @@ class SDKTest : public test::LibraryTest {
   }
   // Nothing may leave the mutex taken, on no way.
   void TearDown() override {
-    ASSERT_TRUE(SDKMutex().TryLock());
-    (void)SDKMutex().Unlock();
+    const bool is_free = SDKMutex().TryLock();
+    if (is_free) (void)SDKMutex().Unlock();
+    ASSERT_TRUE(is_free);
   }
 };
 

@@ -1,7 +1,8 @@
 #pragma once
 
 /// The platform's error details. Each platform call that fails sets them for its own thread; they stay until the next
-/// failure. Calls that succeed leave them alone.
+/// failure of that thread. Calls that succeed leave them alone: ask only after a call has failed. The codes are what
+/// programs decide by; the place is for the log.
 
 #ifdef __cplusplus
 extern "C" {
@@ -9,6 +10,7 @@ extern "C" {
 
 enum {
   KOVA_ERR_NONE = 0,
+  /// An argument is null, empty, too long, or not of the form that the call asks for.
   KOVA_ERR_BAD_PARAMETER = 0x0D00,
   KOVA_ERR_BAD_CONFIGURATION = 0x0E00,  ///< the share table or the configuration cannot be used
   KOVA_ERR_NO_SUCH_SHARE = 0x1400,

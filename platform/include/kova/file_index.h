@@ -2,8 +2,9 @@
 
 #include <stddef.h>
 
-/// Where a share's index and queue live. Each fills `buffer` with a zero-ended text and returns 0, or below 0 when it
-/// does not fit or the argument is unusable.
+/// Where a share's index and queue live. Programs and daemons that speak of one share come to the same paths by these.
+/// Each fills `buffer` with a zero-ended text and returns 0, or below 0 when it does not fit or the argument is
+/// unusable.
 
 #ifdef __cplusplus
 extern "C" {

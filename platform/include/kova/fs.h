@@ -4,7 +4,9 @@
 
 #include <kova/string_list.h>
 
-/// File systems, mount points, snapshots, permissions, copies.
+/// File systems, mount points, snapshots, permissions, copies. Paths are absolute and zero-ended. Each call asks the
+/// kernel and may block for as long as the file system that holds the path does. All may be called by several threads
+/// at once; failures are recorded for the calling thread (kova/error.h).
 
 #ifdef __cplusplus
 extern "C" {
@@ -35,7 +37,8 @@ enum {
   KOVA_FS_EROFS = 67,
 };
 
-/// The type code of the file system that holds `path`; below 0 when it cannot be asked. `follow_mount` is unused, 0.
+/// The type code of the file system that holds `path`, KOVA_FS_UNKNOWN for one that is not listed; below 0 when it
+/// cannot be asked. `follow_mount` is unused, 0.
 int KOVAGetFSType(const char* path, int follow_mount);
 /// 1 for a type whose files live on another machine, else 0.
 int KOVAFSIsRemoteFS(int type);
@@ -51,14 +54,18 @@ int KLIBFhsPathInSnapshot(const char* path, int* in_snapshot);
 int KOVAEAIsHiddenDir(const char* name);
 
 enum { KOVA_PERM_READ = 4, KOVA_PERM_WRITE = 2, KOVA_PERM_EXECUTE = 1 };
-/// The calling user's permissions on `path` as a mask of KOVA_PERM_*; below 0 on failure.
+/// The calling user's permissions on `path` as a mask of KOVA_PERM_*; below 0 on failure. The effective identity counts
+/// (kova/user.h), and access control lists with it.
 int KOVAACLPermGet(const char* path);
 
 /// Options of a copy. words[0] = 1: overwrite; words[1] = 1: move (delete the source afterwards).
 typedef struct KOVAFileCopyOptions {
   uint32_t words[16];
 } KOVAFileCopyOptions;
-/// Copies or moves the file `src` to `dst`, with its mode, owner and times. 0, or below 0 with `dst` as it was before.
+/// Copies or moves the file `src` (only a regular one is copied) to `dst`, with its mode, owner and times; `flag` is
+/// passed over. The copy is written beside `dst`, synced and renamed, so that `dst` is the old file or the whole new
+/// one. Without "overwrite" a file that is there already is a failure (errno EEXIST). 0, or below 0 with `dst` as it
+/// was before.
 int KOVAFileCopy(const char* src, const char* dst, const KOVAFileCopyOptions* options, int flag);
 
 #ifdef __cplusplus

@@ -6,7 +6,10 @@
 
 namespace kova {
 
-/// A field of /proc/self/mountinfo, in which blanks, tabs, newlines and backslashes stand as "\040" and so on.
+/// The plain text of a field of /proc/self/mountinfo. The kernel separates the fields by blanks and writes blanks,
+/// tabs, newlines and backslashes within them as a backslash and three octal digits: "\040" is a blank. A backslash
+/// that less than three characters follow stays as it is. The field must come from the kernel: the digits are not
+/// checked.
 inline std::string PlainMountField(std::string_view field) {
   std::string plain;
   for (size_t i = 0; i < field.size(); ++i) {

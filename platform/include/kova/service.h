@@ -1,6 +1,6 @@
 #pragma once
 
-/// Services and programs.
+/// Services and programs. Failures are recorded for the calling thread (kova/error.h).
 
 #ifdef __cplusplus
 extern "C" {
@@ -22,7 +22,7 @@ int KLIBServiceIsRunning(const char* name);
 /// Runs `path` with the given arguments (the list ends with a null `char*`), without a shell, and waits for it.
 /// Returns its exit status, below 0 when it could not be started or was killed.
 int KLIBCExec(const char* path, const char* argument, ...) __attribute__((sentinel));
-/// The same with an option word, which only the appliance's own programs know.
+/// The same. `options` is passed over: on this host it has no meaning.
 int KLIBCExecl(const char* path, unsigned int options, const char* argument, ...) __attribute__((sentinel));
 
 #ifdef __cplusplus

@@ -41,7 +41,8 @@ class __attribute__((visibility("default"))) SockConnection {
   SockConnection& operator=(const SockConnection&) = delete;
   virtual ~SockConnection();
 
-  /// Connects; false when the peer is not there.
+  /// Connects, in place of an earlier connection of this object; false when the peer is not there or takes no
+  /// connection for 10 s.
   virtual bool Connect() = 0;
   /// Sends one message; false when it is over the limit, or the peer is gone or takes nothing for `kIdleTimeoutSec`.
   bool Send(const std::string& message);

@@ -1,6 +1,7 @@
 #pragma once
 
-/// A growing list of texts, as the platform's enumerations return it.
+/// A growing list of zero-ended texts, as the platform's enumerations return it. An enumeration appends to a list that
+/// its caller has made and frees. Belongs to one thread at a time.
 
 #ifdef __cplusplus
 extern "C" {

@@ -2,7 +2,8 @@
 
 #include <stdint.h>
 
-/// Users, groups and the process's identity. Not safe for concurrent use, like kova/share.h.
+/// Users, groups and the process's identity. Not safe for concurrent use, like kova/share.h: callers hold the same
+/// mutex. The host's user database answers, which may be on another machine: a call may block for as long as that.
 
 #ifdef __cplusplus
 extern "C" {
