@@ -5,7 +5,8 @@
 #include <string>
 #include <vector>
 
-/// Users and groups by the name service switch.
+/// Users and groups by the name service switch: the host's files, a domain, a directory. A call may block for as long
+/// as a server on the network does. May be called by several threads at once.
 namespace kova::host {
 
 struct Account {

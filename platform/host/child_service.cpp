@@ -65,12 +65,15 @@ pid_t RunningPid(const ServiceRow& service) {
   return flock(file.Get(), LOCK_SH | LOCK_NB) != 0 && errno == EWOULDBLOCK ? pid : 0;
 }
 
+/// Whether the service takes connections; one without a socket is ready when it runs.
 bool Answers(const ServiceRow& service) {
   if (service.socket == nullptr) return true;
   const base::UniqueFd connection(ConnectUnixSocket(InstanceRoot() + service.socket));
   return connection.Valid();
 }
 
+/// Where a service's program is installed, "" when nowhere: the folders of child_service.h, in that order.
+/// FERROX_LIBEXEC does not count in a process with raised privileges.
 std::string FindProgram(const std::string& program) {
   std::string folders[4];
   const char* given = secure_getenv("FERROX_LIBEXEC");
@@ -110,7 +113,8 @@ std::streamoff FileSize(const std::string& path) {
   return stat(path.c_str(), &info) == 0 ? info.st_size : 0;
 }
 
-/// Keeps other processes from starting or stopping the same service.
+/// Keeps other processes from starting or stopping the same service meanwhile: two that both find it stopped would
+/// start it twice. The file stays; the kernel ends the lock with its holder.
 class SwitchLock {
  public:
   explicit SwitchLock(const ServiceRow& service)

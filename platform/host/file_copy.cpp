@@ -63,7 +63,8 @@ bool CopyAttributes(int to, const struct stat& info) {
   return fchmod(to, mode) == 0 && futimens(to, times) == 0;
 }
 
-/// Gives the finished file its name.
+/// Gives the finished file its name. Without `overwrite` a file that is there already must not be replaced even when it
+/// comes at the last moment: by a rename that refuses, else (older file systems) by a hard link, which refuses too.
 bool Publish(const std::string& temporary, const std::string& dst, bool overwrite) {
   if (overwrite) return rename(temporary.c_str(), dst.c_str()) == 0;
   if (renameat2(AT_FDCWD, temporary.c_str(), AT_FDCWD, dst.c_str(), RENAME_NOREPLACE) == 0) return true;

@@ -6,7 +6,9 @@
 
 #include <json/value.h>
 
-/// Each reads a member of an object; false when it is there with another type. A missing one leaves `out` as it is.
+/// For files that people write: a member of the wrong type is a mistake to be reported, not a missing one. Each reads a
+/// member of an object; false, with `out` as it was (an array: with a part of it), when it has another type. A missing
+/// member is no mistake and leaves `out` as it was.
 namespace kova::host {
 
 inline bool ReadMember(const Json::Value& object, const char* key, bool& out) {

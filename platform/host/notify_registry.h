@@ -7,12 +7,14 @@
 /// What MonitorQueue of kova/notifyd.h keeps on disk for the notification daemon: docs/formats/notifyd.md.
 namespace kova::host {
 
+/// One watched folder of a registration.
 struct Watch {
   std::string path;
   uint32_t mask = 0;
   std::vector<std::string> ignore = {};
 };
 
+/// One queue of an application, and the folders that are reported into it.
 struct Registration {
   std::string application;
   int type = 0;

@@ -93,6 +93,7 @@ SeenFile Look(const std::string& path) {
   return file;
 }
 
+/// The last answer and what it was made from. One mutex around all: testparm runs once, whoever asks.
 class Source {
  public:
   std::shared_ptr<const std::vector<ShareEntry>> Get() {

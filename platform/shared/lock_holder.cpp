@@ -22,7 +22,8 @@ namespace kova {
 
 namespace {
 
-/// As far as it can be read: a process may end meanwhile, and reading its files fails then.
+/// The content of a file below /proc, as far as it can be read: a process may end meanwhile, and reading its files
+/// fails then.
 std::string ReadWhole(const std::string& path) {
   std::ifstream file(path);
   std::ostringstream text;
@@ -51,7 +52,8 @@ std::vector<int> NumbersIn(const std::string& folder) {
   return numbers;
 }
 
-/// A process that has the file open may hold nothing, and may hold what one that has ended took.
+/// Whether the process holds a lock by one of its open files. That it has the file open says nothing: the kernel lists
+/// the locks of each open file in its "fdinfo", also those that another process took and has inherited to it.
 bool Holds(pid_t pid, const struct stat& file) {
   const std::string folder = ProcessFolder(pid);
   for (const int fd : NumbersIn(folder + "/fd")) {

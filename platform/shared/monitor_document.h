@@ -7,6 +7,7 @@
 
 namespace kova {
 
+/// The form of a registration with the notification daemon, which the host's platform and the tests' fake check alike.
 /// What keeps `document` from being a registration of kova/notifyd.h; empty when nothing does.
 std::string MonitorDocumentProblem(const Json::Value& document);
 

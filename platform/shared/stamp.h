@@ -7,6 +7,7 @@
 
 namespace kova {
 
+/// The "_KOVAStamp" of kova/content_extract.h. Times are in nanoseconds since the epoch.
 /// A text that differs when size, content, attributes or the file itself do.
 std::string StampText(uint64_t size, int64_t mtime_ns, int64_t ctime_ns, uint64_t inode);
 

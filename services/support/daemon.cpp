@@ -40,7 +40,8 @@ base::UniqueFd BlockSignals() {
   return base::UniqueFd(signalfd(-1, &set, SFD_CLOEXEC | SFD_NONBLOCK));
 }
 
-/// The threads of a daemon need little of it, and there are many; where address space is short, it would be gone.
+/// Gives the threads that start from now on 2 MiB of stack each in place of the usual 8: there are many, they need
+/// little, and the addresses of a 32-bit process would be used up by them.
 void MakeStacksSmall() {
   constexpr size_t kStackBytes = 2 << 20;
   pthread_attr_t attributes;
@@ -50,7 +51,9 @@ void MakeStacksSmall() {
   (void)pthread_attr_destroy(&attributes);
 }
 
-/// A process that was killed lets go of its locks only when the last of its threads has ended.
+/// Takes the lock, waiting for a holder that is ending: a process that was killed lets go of its locks only when the
+/// last of its threads has ended, which takes seconds for a large one. False at once when a process that goes on holds
+/// it.
 bool LockWithPatience(int fd, const std::string& path) {
   constexpr int kAttempts = 20, kAttemptsOfEnding = 200;
   constexpr std::chrono::milliseconds kPause(50);

@@ -6,6 +6,7 @@
 
 namespace ferrox::services {
 
+/// To be made before the first thread: signals are blocked for those that start later.
 /// What every daemon does at its start, in this order: refuses an unusable instance root, makes the instance's runtime
 /// folders, opens the log (standard error too in an instance), turns SIGTERM and SIGINT into StopFd, ignores SIGHUP and
 /// SIGPIPE, takes the pid file, whose lock lasts as long as the process, and sees to the instance's lock files.
@@ -15,12 +16,14 @@ class Daemon {
   explicit Daemon(const std::string& name);
   Daemon(const Daemon&) = delete;
   Daemon& operator=(const Daemon&) = delete;
-  /// Empties the pid file, unless it is an exception that ends the daemon: what a killed one leaves is told apart.
+  /// Empties the pid file, unless it is an exception that ends the daemon: a pid file that is not empty and not locked
+  /// is that of a daemon that died.
   ~Daemon();
 
   /// Becomes readable when the daemon was asked to stop (SIGTERM, SIGINT).
   int StopFd() const { return stop_fd_.Get(); }
-  /// Tells whoever started the daemon that it is ready (a service manager by its notification socket).
+  /// Tells the service manager that the daemon answers from now on, by the socket that NOTIFY_SOCKET names; does
+  /// nothing without one.
   void NotifyReady();
   /// Whether its pid file is still where it belongs: the folder of a private instance may have been removed.
   bool HasPidFile() const;

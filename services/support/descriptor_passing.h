@@ -8,7 +8,7 @@
 
 namespace ferrox::services {
 
-/// At most so many descriptors go with one message.
+/// The most descriptors that go with one message.
 inline constexpr size_t kPassedMax = 2;
 
 /// Sends `bytes` whole, and descriptors with them, without waiting for room. @return whether all of it was sent
