@@ -1,3 +1,4 @@
+// Catches changes that the watcher of a whole file system misses, or tells of the wrong path.
 #include "services/kovanotifyd/filesystem/filesystem_watcher.h"
 
 #include <fcntl.h>
@@ -26,6 +27,7 @@
 
 #include "base/path.h"
 #include "base/scope_exit.h"
+#include "tests/notifyd/random_changes.h"
 #include "tests/notifyd/watcher_recorder.h"
 #include "tests/support/temp_dir.h"
 
@@ -303,50 +305,9 @@ class BelievedTree {
   std::set<std::string> in_doubt_;
 };
 
-/// Random changes of a tree. Few names come again and again; fresh ones never, and so no records are joined.
-class RandomChanges {
- public:
-  RandomChanges(std::string root, unsigned seed, bool fresh_names)
-      : root_(std::move(root)), random_(seed), fresh_names_(fresh_names) {}
-
-  void Do() {
-    const std::vector<fs::path> all = {fs::recursive_directory_iterator(root_), fs::recursive_directory_iterator()};
-    const auto any = [&] { return all.empty() ? fs::path(root_) : all[random_() % all.size()]; };
-    const fs::path folder = fs::is_directory(any()) ? any() : fs::path(root_);
-    const fs::path place = (fs::is_directory(folder) ? folder : fs::path(root_)) / NextName();
-    const fs::path victim = any();
-    switch (random_() % 10) {
-      case 0:
-      case 1:
-        (void)mkdir(place.c_str(), 0755);
-        return;
-      case 2:
-      case 3:
-        (void)close(open(place.c_str(), O_CREAT | O_WRONLY | O_CLOEXEC, 0644));
-        return;
-      case 4:
-        if (all.size() > 40) fs::remove_all(victim);
-        return;
-      case 5:
-        if (!fresh_names_) (void)renameat2(AT_FDCWD, victim.c_str(), AT_FDCWD, any().c_str(), RENAME_EXCHANGE);
-        return;
-      default:
-        if (victim != root_) (void)rename(victim.c_str(), place.c_str());
-    }
-  }
-
- private:
-  std::string NextName() { return "n" + std::to_string(fresh_names_ ? next_++ : static_cast<int>(random_() % 5)); }
-
-  std::string root_;
-  std::mt19937 random_;
-  bool fresh_names_;
-  int next_ = 0;
-};
-
 /// Reads now and then, or, with every third seed, all the time while another process makes the changes.
 void FilesystemWatcherTest::MakeChanges(unsigned seed, bool fresh_names) {
-  RandomChanges changes(Root(), seed, fresh_names);
+  test::RandomChanges changes(Root(), seed, fresh_names);
   std::mt19937 random(seed);
   const bool is_beside = seed % 3 == 0;
   const pid_t child = is_beside ? fork() : 0;

@@ -1,3 +1,4 @@
+// Catches folders that are not watched, and changes told with a path that was not the one of the moment.
 #include "services/kovanotifyd/folders/folder_watcher.h"
 
 #include <fcntl.h>
@@ -20,6 +21,7 @@
 
 #include "services/kovanotifyd/folders/fan_inode_port.h"
 #include "services/kovanotifyd/folders/inotify_port.h"
+#include "tests/notifyd/random_changes.h"
 #include "tests/notifyd/watcher_recorder.h"
 #include "tests/support/temp_dir.h"
 
@@ -349,56 +351,6 @@ TEST_P(FolderWatcherTest, MountsBelowARootAreNotEnteredAndCanBeUnmounted) {
   }
 }
 
-/// What the random operations are made of: few names, so that they meet often.
-class RandomOperations {
- public:
-  RandomOperations(const std::string& root, unsigned seed) : root_(root), random_(seed) {}
-
-  void Do() {
-    const std::string a = Place();
-    const std::string b = Place();
-    switch (random_() % 12) {
-      case 0:
-      case 1:
-      case 2:
-        (void)mkdir(a.c_str(), 0755);
-        break;
-      case 3: {
-        std::error_code error;
-        fs::create_directories(a + "/x/y/z", error);
-        break;
-      }
-      case 4: {
-        std::error_code error;
-        fs::remove_all(a, error);
-        break;
-      }
-      case 5:
-        (void)mknod(a.c_str(), S_IFREG | 0600, 0);
-        break;
-      case 6:
-        (void)unlink(a.c_str());
-        break;
-      case 7:
-        (void)renameat2(AT_FDCWD, a.c_str(), AT_FDCWD, b.c_str(), RENAME_EXCHANGE);
-        break;
-      default:
-        (void)rename(a.c_str(), b.c_str());
-    }
-  }
-  size_t Number(size_t below) { return random_() % below; }
-
- private:
-  std::string Place() {
-    std::string path = root_;
-    for (size_t depth = 1 + random_() % 4; depth > 0; --depth) path += std::string("/") + "abx"[random_() % 3];
-    return path;
-  }
-
-  std::string root_;
-  std::mt19937 random_;
-};
-
 TEST_P(FolderWatcherTest, AnyOrderOfOperationsEndsWithTheTreeOnDisk) {
   for (unsigned seed = 1; seed <= 6; ++seed) {
     SCOPED_TRACE("seed " + std::to_string(seed));
@@ -406,12 +358,13 @@ TEST_P(FolderWatcherTest, AnyOrderOfOperationsEndsWithTheTreeOnDisk) {
     fs::create_directory(root_);
     MakeWatcher({});
     Cover();
-    RandomOperations operations(root_, seed);
+    test::RandomChanges changes(root_, seed, false);
+    std::mt19937 random(seed);
     const size_t stretch = seed % 3 == 0 ? 200 : 1 + seed % 20;
     for (int i = 0; i < 300; ++i) {
-      operations.Do();
-      if (operations.Number(stretch) == 0) (void)watcher_->Read(seen_);
-      if (operations.Number(stretch) == 0) (void)watcher_->Advance(milliseconds(0), seen_);
+      changes.Do();
+      if (random() % stretch == 0) (void)watcher_->Read(seen_);
+      if (random() % stretch == 0) (void)watcher_->Advance(milliseconds(0), seen_);
     }
     Settle();
     ASSERT_EQ(seen_.model, OnDisk());
@@ -429,8 +382,8 @@ TEST_P(FolderWatcherTest, AFastWriterBesideTheReaderLosesNothing) {
     Cover();
     std::atomic<bool> done = false;
     std::thread writer([&] {
-      RandomOperations operations(root_, seed);
-      for (int i = 0; i < 1500; ++i) operations.Do();
+      test::RandomChanges changes(root_, seed, false);
+      for (int i = 0; i < 1500; ++i) changes.Do();
       done = true;
     });
     while (!done) {
