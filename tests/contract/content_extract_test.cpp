@@ -24,7 +24,6 @@ namespace {
 
 using std::string;
 
-constexpr size_t kMiB = 1 << 20;
 constexpr char kService[] = "kovacontentextractd";
 
 class ContentExtractTest : public testing::Test {
@@ -114,15 +113,6 @@ TEST_F(ContentExtractTest, TheContentTellsWhatTheNameDoesNot) {
     EXPECT_EQ(row.has_text, document.isMember("KOVAMDTextContent")) << row.name;
     EXPECT_TRUE(document["_KOVAExtractVersion"].isInt()) << row.name;
   }
-}
-
-TEST_F(ContentExtractTest, LongTextComesWholeUpToTheLimit) {
-  string text;
-  while (text.size() < 3 * kMiB) text += "\u20ac";
-  const Json::Value document = ParseBytes("long.txt", text);
-  EXPECT_EQ(text.substr(0, kMiB / 3 * 3), document["KOVAMDTextContent"].asString());
-  EXPECT_TRUE(document["_KOVATextCut"].asBool());
-  EXPECT_EQ("partly read: only the first 1 MiB of its text", document["_KOVAExtractError"].asString());
 }
 
 TEST_F(ContentExtractTest, SpecialAndUnreadableFilesAreNamesWithAReason) {

@@ -61,7 +61,7 @@ class ManagementWalkTest(InstanceTestCase):
         self.instance.make_volume(self, f"{self.vol}2")
         self.pause_and_resume(papers, films)
         self.forget_a_volume(papers)
-        self.rename_a_user()
+        self.homes_and_bins()
         self.delete_all(papers)
 
     def switch_a_kind(self, docs, roof, films, anna, berta):
@@ -85,23 +85,17 @@ class ManagementWalkTest(InstanceTestCase):
         self.assertEqual(6, written() - before, "no kind was changed")
 
     def rename_and_move(self, docs):
-        old_queue = self.instance.queue_path(docs)
+        """What is read and found meanwhile, test_what_moves_is_not_read_again looks at."""
+        queues = [self.instance.queue_path(docs), self.instance.queue_path(f"{self.vol}/papers")]
         self.ctl("share", "rename", "docs", "papers")
         papers = f"{self.vol}/papers"
-        self.assertFalse(os.path.exists(docs) or os.path.exists(old_queue))
-        self.assertEqual(["/media/films", "/papers/letters", "/papers/plans"],
-                         sorted(folder["path"] for folder in self.instance.folders()))
         self.expect_documents("papers", papers, f"{papers}/letters", f"{papers}/plans")
-        self.assertIn(os.fsencode(f"{papers}/letters/anna.txt"), self.instance.search("anna"))
-        self.assertEqual({"fileindex_papers", "fileindex_media"}, set(self.indices()))
-
         moved = f"{self.vol}2/papers"
         os.makedirs(f"{self.vol}2")
         os.rename(papers, moved)
         self.ctl("share", "migrate", "papers", moved)
         self.expect_documents("papers", moved, f"{moved}/letters", f"{moved}/plans")
-        self.expect_found("berta", f"{moved}/letters/berta.txt")
-        self.assertFalse(os.path.exists(self.instance.queue_path(papers)))
+        self.assertEqual([], [path for path in [docs, *queues] if os.path.exists(path)])
         return moved
 
     def pause_and_resume(self, papers, films):
@@ -140,16 +134,12 @@ class ManagementWalkTest(InstanceTestCase):
         self.ctl("folder", "add", "/papers/letters", "/papers/plans")
         self.expect_documents("papers", papers, f"{papers}/letters", f"{papers}/plans")
 
-    def rename_a_user(self):
+    def homes_and_bins(self):
         homes = self.share_without_folders("homes")
-        for user in ("anna", "annabel"):
+        for user in ("carla", "annabel"):
             write(f"{homes}/{user}/notes/diary.txt", f"capybara of {user}")
-        self.ctl("folder", "add", "/homes/anna", "/homes/annabel/notes", "/homes/anna/notes")
-        self.expect_documents("homes", homes, f"{homes}/anna", f"{homes}/annabel/notes")
-        os.rename(f"{homes}/anna", f"{homes}/carla")
-        self.ctl("user", "rename", "anna", "carla")
+        self.ctl("folder", "add", "/homes/carla", "/homes/annabel/notes")
         self.expect_documents("homes", homes, f"{homes}/carla", f"{homes}/annabel/notes")
-        self.expect_found("capybara", f"{homes}/carla/notes/diary.txt", f"{homes}/annabel/notes/diary.txt")
         write(f"{homes}/carla/#recycle/old.txt", "capybara in the bin")
         self.instance.queue(homes, event(CREATE, f"{homes}/carla/#recycle/old.txt"))
         for old, new, text in (("nope", "x", "neither"), ("carla", "anna", "still there")):
