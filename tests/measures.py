@@ -1,13 +1,14 @@
 #!/usr/bin/env python3
-"""Prints the measures that keep this house in order, and with --check fails where one of the marks does not hold.
+"""Prints the measures that this code is kept by, and with --check fails where one of the marks does not hold.
 
-Lines are raw lines (blank and comment lines included) of the files that git knows, but for the comment share. What counts:
+Lines are raw lines (blank and comment lines included) of the files that git knows, but for the comment share.
 
 code            the C++ of base, platform, common, sdk, wire, fileindex, services and cli
 tests           the C++ and the Python in tests/. Not counted: data files (those that are neither), CMake and shell files,
                 and the fuzz targets and the benchmarks, whose sizes are printed beside
 comment share   lines with a comment, be it behind code, among all lines that are not blank
-public headers  those of base, common, sdk, wire and platform/include, and what cmake/FerroxInstall.cmake installs of fileindex
+public headers  those of base, common, sdk, wire and platform/include, and of fileindex what cmake/FerroxInstall.cmake
+                installs
 functions       as universal-ctags finds them; left out where it is not installed
 """
 import argparse
@@ -29,7 +30,8 @@ FILE_LINES, FUNCTION_LINES, FUNCTION_AIM = 300, 50, 30
 COMMENTS_MIN, PUBLIC_COMMENTS_MIN, TESTS_MAX = 15, 45, 0.36  # percent, percent, tests per line of code
 STANDARD_MUTEX = re.compile(r"\bstd::(recursive_|shared_|timed_)*mutex\b|\bstd::condition_variable")
 # What of a line matters here: a literal (raw, string, character; not the ' in 1'000), a comment, any other text.
-TOKENS = re.compile(r'(?P<literal>R"(?P<end>[^(\s]{0,16})\(.*?\)(?P=end)"|"(?:\\.|[^"\\\n])*"|(?<![0-9a-fA-F])\'(?:\\.|[^\'\\\n])+\')'
+TOKENS = re.compile(r'(?P<literal>R"(?P<end>[^(\s]{0,16})\(.*?\)(?P=end)"|"(?:\\.|[^"\\\n])*"'
+                    r"|(?<![0-9a-fA-F])'(?:\\.|[^'\\\n])+')"
                     r"|(?P<comment>//[^\n]*|/\*.*?\*/)|(?P<other>\S)", re.S)
 
 

@@ -1,3 +1,4 @@
+// Catches words and options that are taken for something else, and figures that people would misread.
 #include "cli/command.h"
 
 #include <gtest/gtest.h>

@@ -1,3 +1,4 @@
+// Catches names of files that could steer a terminal, and names that a script would not get back byte for byte.
 #include "cli/escape.h"
 
 #include <gtest/gtest.h>

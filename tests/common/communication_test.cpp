@@ -1,3 +1,4 @@
+// Catches requests to a daemon that are cut short, sent to nobody without a word, or never waited for.
 #include "common/communication.h"
 
 #include <sys/socket.h>

@@ -1,3 +1,4 @@
+// Catches paths cut in the wrong place, and files of which a failed replacement leaves half.
 #include "common/file_util.h"
 
 #include <sys/stat.h>

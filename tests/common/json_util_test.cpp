@@ -1,3 +1,4 @@
+// Catches bytes that JSON loses, two values taken for one, and errors that do not show the whole object.
 #include "common/json_util.h"
 
 #include <sys/resource.h>

@@ -1,3 +1,4 @@
+// Catches locks that two hold at once, that outlive their file, or that are waited for without end.
 #include "common/lock_file.h"
 
 #include <fcntl.h>

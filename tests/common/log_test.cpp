@@ -1,3 +1,4 @@
+// Catches failures whose log line names another condition or errno, and texts that could forge a line.
 #include "common/log.h"
 
 #include <syslog.h>

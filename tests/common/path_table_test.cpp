@@ -1,3 +1,4 @@
+// Catches paths found below a folder whose name they merely begin with, and deep paths that cost too much.
 #include "base/path_table.h"
 
 #include <map>

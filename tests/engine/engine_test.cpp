@@ -1,3 +1,4 @@
+// Catches requests that the engine answers with the wrong code, and changes and pages of hits that get lost.
 #include "services/kovaelasticd/engine.h"
 
 #include <sys/stat.h>

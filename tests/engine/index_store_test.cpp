@@ -1,3 +1,4 @@
+// Catches documents that are not found by a part of theirs, or found when they are gone or not committed.
 #include <map>
 #include <memory>
 #include <string>

@@ -1,3 +1,4 @@
+// Catches searches that wait for writers, and committed changes lost beside failures, full disks and threads.
 #include "services/kovaelasticd/index.h"
 
 #include <filesystem>

@@ -1,3 +1,4 @@
+// Catches queries read as something else, and refusals without their place and remedy.
 #include <stdlib.h>
 #include <time.h>
 

@@ -1,3 +1,4 @@
+// Catches marks in the wrong place, and bytes of a text that reach a terminal through its snippet.
 #include "services/kovaelasticd/snippet.h"
 
 #include <string>

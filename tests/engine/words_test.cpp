@@ -1,3 +1,4 @@
+// Catches words that are cut or folded unlike in the indices that exist already.
 #include "services/kovaelasticd/words.h"
 
 #include <string>

@@ -1,3 +1,4 @@
+// Catches what a hostile worker could make the daemon believe, or copy, by its answer.
 #include "services/kovacontentextractd/answer.h"
 
 #include <unistd.h>

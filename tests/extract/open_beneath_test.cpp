@@ -1,3 +1,4 @@
+// Catches files outside of a share that are reached through a link or a path, also while folders are swapped.
 #include "services/kovacontentextractd/open_beneath.h"
 
 #include <fcntl.h>

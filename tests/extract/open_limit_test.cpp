@@ -1,3 +1,4 @@
+// Catches folders that do not answer and take all the threads with them.
 #include "services/kovacontentextractd/open_limit.h"
 
 #include <gtest/gtest.h>

@@ -1,3 +1,4 @@
+// Catches a byte sequence on which the fast check of UTF-8 differs from the definition.
 #include "services/kovacontentextractd/readers/utf8.h"
 
 #include <random>

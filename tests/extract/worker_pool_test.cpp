@@ -1,3 +1,4 @@
+// Catches workers that escape, good files blamed for bad ones, and anything a misbehaving worker leaves behind.
 #include "services/kovacontentextractd/worker_pool.h"
 
 #include <fcntl.h>

@@ -1,3 +1,4 @@
+// Catches tokens that depend on how the bytes arrive, and containers that expand, hide or repeat members.
 #include <gtest/gtest.h>
 
 #include "services/kovacontentextractd/readers/xml_tokenizer.h"

@@ -1,3 +1,4 @@
+// Catches documents that a change of the indexed folders leaves, loses, or reads again needlessly.
 #include <algorithm>
 
 #include "fileindex/status_mgr.h"

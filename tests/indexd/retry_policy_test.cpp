@@ -1,3 +1,4 @@
+// Catches failures that are retried too soon, too late, or told in the wrong words.
 #include "services/fileindexd/retry_policy.h"
 
 #include <sstream>

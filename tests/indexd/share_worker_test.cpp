@@ -1,3 +1,4 @@
+// Catches an index that does not end as the disk, however the worker is interrupted and files change meanwhile.
 #include "services/fileindexd/share_worker.h"
 
 #include <unistd.h>

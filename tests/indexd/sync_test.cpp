@@ -1,3 +1,4 @@
+// Catches a sync that returns before earlier changes are committed, or never.
 #include <future>
 
 #include "services/fileindexd/worker_set.h"

@@ -1,3 +1,4 @@
+// Catches failures of tasks that get lost, and urgent tasks and interruptions that have to wait.
 #include "services/fileindexd/task_pool.h"
 
 #include <future>

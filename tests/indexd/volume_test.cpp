@@ -1,3 +1,4 @@
+// Catches an unmounted volume that is taken for a deletion of all that was on it.
 #include <sys/mount.h>
 
 #include "platform/host/mounts.h"

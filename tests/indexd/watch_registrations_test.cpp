@@ -1,3 +1,4 @@
+// Catches folders that are indexed and not watched, or watched and no longer indexed.
 #include "services/fileindexd/watch_registrations.h"
 
 #include <kova/notifyd.h>

@@ -1,3 +1,4 @@
+// Catches shares without a worker or with an old one, and a hung engine that makes the daemon mute.
 #include "services/fileindexd/worker_set.h"
 
 #include <sys/socket.h>

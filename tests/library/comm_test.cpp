@@ -1,3 +1,4 @@
+// Catches replies of the engine that become another result or error, and a busy engine that is given up.
 #include "fileindex/elastic/comm.h"
 
 #include <cerrno>

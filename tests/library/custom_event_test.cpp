@@ -1,3 +1,4 @@
+// Catches queued lines that are torn, doubled or lost without the share being marked for a reindex.
 #include "fileindex/queue/custom_event.h"
 
 #include <sys/resource.h>

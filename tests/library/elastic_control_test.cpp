@@ -1,3 +1,4 @@
+// Catches requests to the engine and a schema that differ from what both sides agreed to.
 #include "fileindex/elastic/elastic_control.h"
 
 #include <map>

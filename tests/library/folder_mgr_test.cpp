@@ -1,3 +1,4 @@
+// Catches the wrong folder governing a path, kinds that change unsaid, and a list that a failed save destroys.
 #include "fileindex/folders/folder_mgr.h"
 
 #include <fcntl.h>

@@ -1,3 +1,4 @@
+// Catches stored folders that are read differently, and a status that depends on what else was asked.
 #include "fileindex/folders/folder.h"
 
 #include <array>

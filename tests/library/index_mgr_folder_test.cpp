@@ -1,3 +1,4 @@
+// Catches changes of folders whose steps differ, come in another order, or are not told when one fails.
 #include <sys/wait.h>
 
 #include <csignal>

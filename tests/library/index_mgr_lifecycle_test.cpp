@@ -1,3 +1,4 @@
+// Catches steps of what is done to shares, volumes and users that are missing, misdirected or out of order.
 #include "tests/library/index_mgr_fixture.h"
 
 namespace ferrox::fileindex {

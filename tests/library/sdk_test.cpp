@@ -1,3 +1,4 @@
+// Catches answers of the platform that are misread, and an identity or a lock that is not given back.
 #include <unistd.h>
 
 #include "common/sdk_mutex.h"

@@ -1,3 +1,4 @@
+// Catches marks and pauses that are lost, not told, or readable by root alone.
 #include "fileindex/status_mgr.h"
 
 #include <unistd.h>

@@ -1,3 +1,4 @@
+// Catches paths, kinds of files and exclusions that decide wrongly what is indexed.
 #include "fileindex/util.h"
 
 #include <sstream>

@@ -1,3 +1,4 @@
+// Catches records of the kernel whose lengths would lead out of the buffer.
 #include "services/kovanotifyd/fan_group.h"
 
 #include <cstdint>

@@ -1,3 +1,4 @@
+// Catches folders located where they are now instead of where they were at the moment of a record.
 #include "services/kovanotifyd/filesystem/folder_locator.h"
 
 #include <deque>

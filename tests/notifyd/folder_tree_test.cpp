@@ -1,3 +1,4 @@
+// Catches paths that a tree of folders gets wrong when folders move, vanish and come again.
 #include "services/kovanotifyd/folders/folder_tree.h"
 
 #include <map>

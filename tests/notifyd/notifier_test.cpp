@@ -1,3 +1,4 @@
+// Catches a sync that promises too much or never ends, and registrations that disturb each other.
 #include "services/kovanotifyd/notifier.h"
 
 #include <filesystem>

@@ -1,3 +1,4 @@
+// Catches changed paths that nobody looks at again, in random orders of changes, failures and readers.
 #include <atomic>
 #include <filesystem>
 #include <map>

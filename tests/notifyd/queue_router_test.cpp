@@ -1,3 +1,4 @@
+// Catches changes that become the wrong lines, of the wrong queue, too late, or none while a queue is blocked.
 #include "services/kovanotifyd/queues/queue_router.h"
 
 #include <sys/resource.h>

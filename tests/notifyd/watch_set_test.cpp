@@ -1,3 +1,4 @@
+// Catches folders watched in a worse way than they could be, and gaps that no comparison makes up for.
 #include "services/kovanotifyd/roots/watch_set.h"
 
 #include <sys/mount.h>

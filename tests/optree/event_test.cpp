@@ -1,3 +1,4 @@
+// Catches lines of a queue that are read unlike a JSON library reads them.
 #include <random>
 
 #include <gtest/gtest.h>

@@ -1,3 +1,4 @@
+// Catches sequences of events that fold into operations unlike the plain model of the rules says.
 #include <random>
 
 #include <gtest/gtest.h>

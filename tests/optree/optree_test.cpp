@@ -1,3 +1,4 @@
+// Catches examples of the folding that change, and trees that bad lines, deep paths or their end destroy.
 #include <sstream>
 
 #include <gtest/gtest.h>

@@ -1,3 +1,4 @@
+// Catches queues that are detached twice, given up half done, or lose what is written meanwhile.
 
 #include "fileindex/queue/queue_mgr.h"
 

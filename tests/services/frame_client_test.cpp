@@ -1,3 +1,4 @@
+// Catches failures of a request that look like another, and waits that outlast their time or a cancellation.
 #include "wire/frame_client.h"
 
 #include <sys/socket.h>

@@ -1,3 +1,4 @@
+// Catches clients that cost the server more than their own connection.
 #include "services/support/frame_server.h"
 
 #include <sys/socket.h>
