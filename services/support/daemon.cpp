@@ -52,8 +52,8 @@ void MakeStacksSmall() {
 }
 
 /// Takes the lock, waiting for a holder that is ending: a process that was killed lets go of its locks only when the
-/// last of its threads has ended, which takes seconds for a large one. False at once when a process that goes on holds
-/// it.
+/// last of its threads has ended, which takes seconds for a large one. False after a second when a process that is not
+/// ending holds it.
 bool LockWithPatience(int fd, const std::string& path) {
   constexpr int kAttempts = 20, kAttemptsOfEnding = 200;
   constexpr std::chrono::milliseconds kPause(50);
