@@ -10,7 +10,7 @@ namespace {
 
 constexpr unsigned kPageEntries = 1000;
 
-/// The documents below a folder, one after the other.
+/// The documents below a folder in path order, fetched by pages.
 class DocumentCursor {
  public:
   DocumentCursor(const std::string& folder, ShareIndex& index) : folder_(folder), index_(index) { FetchPage(""); }
@@ -41,7 +41,8 @@ void RemoveBefore(DocumentCursor& cursor, const std::string& path, const Compari
   }
 }
 
-/// Passes over the documents of what cannot be read, without judging them.
+/// Leaves the documents of what cannot be read as they are. Of an unreadable folder these are all below it, and they
+/// come in one piece since both sides are in path order.
 void Keep(DocumentCursor& cursor, const TreeWalk::Entry& entry, const ComparisonActions& actions) {
   const bool below = entry.kind == TreeWalk::Entry::Kind::kUnknownBelow;
   const std::string key = below ? entry.path + "/" : entry.path;
@@ -52,7 +53,8 @@ void Keep(DocumentCursor& cursor, const TreeWalk::Entry& entry, const Comparison
   }
 }
 
-void Judge(DocumentCursor& cursor, const TreeWalk::Entry& entry, const ComparisonActions& actions) {
+/// One step of the merge of disk and index.
+void CompareEntry(DocumentCursor& cursor, const TreeWalk::Entry& entry, const ComparisonActions& actions) {
   actions.examine();
   RemoveBefore(cursor, entry.path, actions);
   const bool indexed = cursor.Current() != nullptr && cursor.Current()->path == entry.path;
@@ -67,7 +69,7 @@ void CompareBelow(const std::string& folder, TreeWalk& walk, ShareIndex& index, 
   TreeWalk::Entry entry;
   while (walk.Next(entry)) {
     if (entry.kind == TreeWalk::Entry::Kind::kFound) {
-      Judge(cursor, entry, actions);
+      CompareEntry(cursor, entry, actions);
     } else {
       Keep(cursor, entry, actions);
     }

@@ -10,15 +10,15 @@
 
 namespace ferrox::indexd {
 
-/// What a comparison found. Called in the order of the paths, by the calling thread.
+/// What a comparison does with what it finds. Called in the byte order of the paths, by the comparing thread.
 struct ComparisonActions {
-  /// Whether the document tells the truth about the file, and all of it that is wanted.
+  /// Whether the document agrees with the file's present state, so that nothing is to be written.
   std::function<bool(const IndexedEntry& indexed, const struct stat& status)> is_current;
-  /// The file is new or changed.
+  /// The file has no document, or one that is not current.
   std::function<void(const std::string& path, const struct stat& status)> write;
   /// The document's file is gone or no longer indexed.
   std::function<void(const std::string& path)> remove;
-  /// Each file walked by, before the others.
+  /// Called for each file found, before the other actions for it: to stop, to commit, to count.
   std::function<void()> examine = [] {};
 };
 

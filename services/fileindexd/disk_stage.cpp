@@ -69,7 +69,7 @@ void DiskStage::Attr(const std::string& path, const std::string&) {
   }
 }
 
-/// The kinds that the operation names are of no use: documents tell which content they hold, so that only those differ
+/// The kinds that the operation names are of no use: documents say which content they hold, so that only those differ
 /// whose kind was switched, also after a change whose event was lost.
 void DiskStage::UpdateCfg(const std::string& path, const std::string&) { comparer_.CompareOnce(path); }
 

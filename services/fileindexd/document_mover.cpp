@@ -15,9 +15,10 @@ using KOVA::CONTENT_EXTRACT::Stamp;
 
 namespace {
 
-/// A folder with fewer documents is moved in one request, which tells of each of them: both sides hold it in memory.
+/// A folder with fewer documents is moved in one request, whose answer lists them all and is held in memory by both
+/// sides.
 constexpr unsigned kMovedAtOnce = 20000;
-/// Documents of which one may tell where a folder was: others may have been deleted or replaced since.
+/// How many documents are tried for one whose file is in the share still: others may have been deleted or replaced.
 constexpr unsigned kSampledDocuments = 1000;
 
 bool IsFolder(const std::string& path) {
@@ -86,7 +87,7 @@ std::vector<std::string> DocumentMover::IndexedTopsOf(const std::string& path) {
 }
 
 /// Whether what the index has at the old path is what is at the new one now. When that has gone on to yet another
-/// place, a later rename will tell; the documents are its, unless there is something new at the old path.
+/// place, a later rename names that; the documents are its, unless there is something new at the old path.
 bool DocumentMover::HoldsDocumentsOf(const std::string& old_path, const std::string& path) {
   struct stat status = {};
   const auto indexed = index_.Find(old_path);

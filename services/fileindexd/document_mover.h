@@ -11,10 +11,11 @@
 
 namespace ferrox::indexd {
 
-/// Takes documents along when what they describe is renamed, to spare reading the files again. Only that: a rename is a
-/// hint, and both places are compared with the disk afterwards. Later renames have carried the earlier ones along in
-/// the queue, which then no longer tells what happened (two folders that were swapped, for example), and an earlier
-/// pass may have seen the disk as it is now.
+/// Moves documents to the new path of what was renamed, to spare reading the files again. A rename is only a hint: a
+/// document is moved when its stamp says that it describes what is at the new path, and both places are compared with
+/// the disk afterwards in any case. Folding has carried later renames into the earlier ones, so the queue does not say
+/// what happened step by step (two folders that were swapped, for example), and an earlier pass may have seen the disk
+/// as it is now.
 class DocumentMover {
  public:
   /// All outlive it; `root` is the share's folder.
@@ -22,19 +23,21 @@ class DocumentMover {
                 DocumentWriter& writer, const Interruption& interruption)
       : root_(root), index_(index), folders_(folders), rules_(rules), writer_(writer), interruption_(interruption) {}
 
-  /// The documents at and below `old_path` that go to `path`.
+  /// One request to the index: the documents at and below `old_path` go to `path`.
   struct Step {
     std::string path;
     std::string old_path;
   };
-  /// What follows the rename of `old_path`, which lay outside the present root when the share itself was renamed or
-  /// moved. Belongs to one thread.
+  /// The steps that the rename of `old_path` to `path` comes to: one where all of it is indexed, else one for each
+  /// indexed folder in it. `old_path` lay outside the present root when the share itself was renamed or moved. For one
+  /// thread.
   std::vector<Step> StepsOf(const std::string& path, const std::string& old_path);
-  /// The folder that was at `top`, or below it, and is the share's folder now, as far as documents there tell; or "".
+  /// The earlier path of the share's folder, which is `top` or lies below it, by a sample of the documents there; ""
+  /// when none of these describes a file that is in the share's folder now.
   std::string RootBeforeMove(const std::string& top);
   /// Whether the document at `path` is of the file or folder that `status` is of, wherever that is by now.
   bool DescribesFile(const std::string& path, const struct stat& status);
-  /// From any thread. @throws Interrupted; Error.
+  /// Carries out a step if the documents describe what is at the new path. From any thread. @throws Interrupted; Error.
   void Move(const Step& step);
 
  private:

@@ -25,8 +25,9 @@ bool IsWorthAnotherTry(const IndexedEntry& indexed) {
          indexed.extract_version < ExtractVersion(indexed.content_type);
 }
 
-/// Whether the content told another type than the name does, which the attributes alone would put in its place.
-bool NameTellsAnotherType(const IndexedEntry& indexed, const std::string& path) {
+/// Whether the content was found to be of another type than the name suggests. A refresh of the attributes alone would
+/// put the name's type in its place.
+bool DiffersFromNameType(const IndexedEntry& indexed, const std::string& path) {
   const char* by_name = kova::content::TypeByExtension(GetFileExtension(Basename(path), true));
   return indexed.with_content && by_name != nullptr && !indexed.content_type.empty() && indexed.content_type != by_name;
 }
@@ -39,7 +40,7 @@ bool DocumentWriter::WantsContent(const std::string& path, const struct stat& st
 
 bool DocumentWriter::IsCurrent(const IndexedEntry& indexed, const struct stat& status) const {
   return indexed.stamp == Stamp(status) && indexed.with_content == WantsContent(indexed.path, status) &&
-         !indexed.cut_untold && !IsWorthAnotherTry(indexed);
+         !indexed.cut_without_reason && !IsWorthAnotherTry(indexed);
 }
 
 void DocumentWriter::Write(const std::string& path) {
@@ -62,7 +63,7 @@ void DocumentWriter::RefreshAttributes(const std::string& path) {
   const auto indexed = index_.Find(path);
   const bool same_content = !indexed.empty() && SameContent(indexed.front().stamp, Stamp(status)) &&
                             indexed.front().with_content == WantsContent(path, status);
-  if (!same_content || NameTellsAnotherType(indexed.front(), path)) return Write(path);
+  if (!same_content || DiffersFromNameType(indexed.front(), path)) return Write(path);
   try {
     WillChange();
     index_.Attr(path);

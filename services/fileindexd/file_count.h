@@ -9,8 +9,9 @@
 
 namespace ferrox::indexd {
 
-/// Counts the files below a folder that are indexed, in a thread of its own while it lives, so that progress has an end
-/// to compare with. A quick count: it only reads names, and stays on the folder's device.
+/// Counts the files below a folder that are indexed, in a thread of its own while it lives, and reports the count to
+/// the status as the comparison's estimate. It only reads names and stays on the folder's device, so that it is far
+/// ahead of the comparison; the rules that need a look at each file are left out.
 class FileCount {
  public:
   /// `folders` and `status` outlive it.

@@ -10,10 +10,12 @@
 
 namespace ferrox::indexd {
 
-/// Waits for files to change or for a call from another thread.
+/// Lets a thread wait until one of some files is made, written or replaced (inotify on their folders), or another
+/// thread wakes it. One thread waits; Wake is for any.
 class FileWatch {
  public:
-  /// Without inotify (its instances are limited), or where a file's folder is missing, only time and Wake end a wait.
+  /// Without inotify (its instances are limited), or where a file's folder is missing, only time and Wake end a wait;
+  /// SeesChanges is false then. @throws Error kInternal.
   explicit FileWatch(const std::vector<std::string>& paths);
 
   /// Returns after a change of one of the files, after Wake, or after `limit`; a change or a Wake since the last wait

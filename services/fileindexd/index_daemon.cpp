@@ -22,7 +22,8 @@ namespace ferrox::indexd {
 
 namespace {
 
-/// The configuration is looked at again after so long, whether or not it was seen to change.
+/// After this time the configuration is read again whether or not it was seen to change; the short one where inotify
+/// does not report changes.
 constexpr std::chrono::seconds kSlowTimer(30);
 constexpr std::chrono::seconds kSlowTimerWithoutWatch(2);
 
@@ -36,7 +37,7 @@ std::vector<std::string> FilesOf(const IndexDaemon::Options& options) {
   return files;
 }
 
-/// A walk holds one open folder a level.
+/// A walk holds one open folder for each level of the tree.
 void AllowManyOpenFiles() {
   rlimit limit = {};
   if (getrlimit(RLIMIT_NOFILE, &limit) != 0) return;
@@ -98,7 +99,7 @@ IndexDaemon::IndexDaemon(const Options& options)
 IndexDaemon::~IndexDaemon() {
   stopping_ = true;
   configuration_.Wake();
-  if (follower_.joinable()) follower_.join();
+  if (configuration_thread_.joinable()) configuration_thread_.join();
 }
 
 void IndexDaemon::Start() {
@@ -109,11 +110,11 @@ void IndexDaemon::Start() {
     Log(LOG_ERR, "the pause is unknown: %s", services::Describe(error).c_str());
   }
   Reconcile();
-  follower_ = std::thread([this] { Follow(); });
+  configuration_thread_ = std::thread([this] { FollowConfiguration(); });
 }
 
-/// Not every operation that changes shares or folders tells the daemon.
-void IndexDaemon::Follow() {
+/// Not every operation that changes shares or folders sends a command.
+void IndexDaemon::FollowConfiguration() {
   while (!stopping_) {
     configuration_.Wait(configuration_.SeesChanges() ? kSlowTimer : kSlowTimerWithoutWatch);
     if (stopping_) return;
@@ -125,7 +126,7 @@ void IndexDaemon::Follow() {
 void IndexDaemon::Reconcile() {
   try {
     workers_.Reconcile();
-    watched_.Reconcile();
+    registrations_.Reconcile();
   } catch (const Error& error) {
     Log(LOG_ERR, "the workers and watches stay as they are: %s", services::Describe(error).c_str());
   }

@@ -17,16 +17,18 @@
 
 namespace ferrox::indexd {
 
-/// Keeps the workers of the shares in step with the folders and shares, and answers the commands that steer them
-/// (docs/formats/daemon.md).
+/// The daemon without its socket: keeps the workers of the shares in step with folders and shares, in a thread of its
+/// own, and answers the commands that steer them (docs/formats/daemon.md). The road of one event begins here:
+///   WorkerSet makes a ShareWorker for each share -> its WorkerLoop does a ShareRound -> QueuePass detaches the queue
+///   -> OperationRunner takes its operations through MoveStage and DiskStage -> DocumentWriter -> ShareIndex.
 class IndexDaemon {
  public:
-  /// Requests that wait for shares hold a thread each; so many at once, so that others are left for the rest.
+  /// How many "sync" requests may wait at once: each holds a request thread, and the other commands need some.
   static constexpr unsigned kSyncsMax = 24;
   static constexpr unsigned kRequestThreads = kSyncsMax + 4;
 
   struct Options {
-    /// Threads that read files, for all shares together; 0: one a processor.
+    /// Threads that read files, for all shares together; 0: one for each processor.
     unsigned workers = 0;
     /// Files that change when shares do; without them that is noticed at intervals.
     std::vector<std::string> share_files = {};
@@ -61,19 +63,19 @@ class IndexDaemon {
   Json::Value OnStatus(const Json::Value& data);
 
   void SetPause(int64_t resume_time);
-  void Follow();
+  void FollowConfiguration();
   void Reconcile();
 
   InterruptibleClock clock_;
   TaskPool pool_;
   PauseState pause_;
   WorkerSet workers_;
-  WatchRegistrations watched_;
+  WatchRegistrations registrations_;
   FileWatch configuration_;
   std::atomic<unsigned> syncs_{0};
   std::atomic<bool> syncs_ended_{false};
   std::atomic<bool> stopping_{false};
-  std::thread follower_;
+  std::thread configuration_thread_;
 };
 
 }  // namespace ferrox::indexd

@@ -28,8 +28,8 @@ class IndexKeeper {
   void EnsureExists(bool may_create);
   /// After a failed round: what was known of the index may not hold any more.
   void OnFailure(int code);
-  /// Ends a pause of the index that no folder of the share is paused for: the paused ones were removed, or whoever
-  /// paused it did not finish. A failure is left for the next time.
+  /// Ends a pause of the index that no folder of the share is paused for: the paused ones were removed, or the
+  /// operation that paused it was not finished. A failure is left for the next time.
   void ResumeUnlessFoldersPaused();
 
   /// Has the next round ask whether the engine has made the index anew. From any thread.

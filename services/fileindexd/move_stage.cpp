@@ -59,7 +59,7 @@ void MoveStage::Finish() {
 }
 
 /// A renamed folder differs twice: under its new path it is configured and there, and under its old one neither. The
-/// old path's document tells which file it was of.
+/// old path's document says which file it was of.
 void MoveStage::MoveRenamedFolders(const std::vector<std::string>& differing) {
   std::vector<std::pair<std::string, struct stat>> there;
   std::vector<std::string> others;

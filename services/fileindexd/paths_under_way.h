@@ -8,10 +8,11 @@
 
 namespace ferrox::indexd {
 
-/// Paths that tasks work on at and below which nobody else may.
+/// The paths that tasks work on. Two of them conflict when one is the other or lies below it: what both hold must be
+/// worked on in order. Belongs to one thread.
 class PathsUnderWay {
  public:
-  /// Whether something at, above or below the path is worked on.
+  /// Whether something at, above or below the path is in work, which a new task has to wait for.
   bool Overlaps(const std::string& path) const {
     const auto next = ordered_.lower_bound(path + "/");
     return (next != ordered_.end() && base::IsBelow(*next, path)) || paths_.HasAtOrAbove(path);
@@ -27,8 +28,8 @@ class PathsUnderWay {
   size_t Count() const { return paths_.Size(); }
 
  private:
-  base::PathTable<bool> paths_;
-  std::set<std::string> ordered_;
+  base::PathTable<bool> paths_;    ///< finds what is at or above a path
+  std::set<std::string> ordered_;  ///< the same paths, finds what is below one
 };
 
 }  // namespace ferrox::indexd

@@ -10,8 +10,8 @@
 
 namespace ferrox::indexd {
 
-/// Looks at what is appended to a queue meanwhile, and takes nothing from it. Belongs to one thread; the queue must not
-/// be detached while it lives.
+/// Reads the lines that are appended to a live queue, without taking them. Belongs to one thread; the queue must not be
+/// detached while it lives.
 class QueueTail {
  public:
   explicit QueueTail(const std::string& queue_path) : path_(queue_path) {}
@@ -25,10 +25,11 @@ class QueueTail {
   off_t read_ = 0;
 };
 
-/// So many files are looked up by their numbers; of more, the whole share is compared.
+/// The documents of at most so many files are searched by inode number; with more, the whole share is compared.
 inline constexpr size_t kChangedNumbersMax = 10000;
 
-/// The numbers by which the lines of a queue call files changed, at most one more than kChangedNumbersMax.
+/// The inode numbers of files that lines of the queue call changed without a path (docs/formats/queue.md), at most one
+/// more than kChangedNumbersMax.
 std::set<uint64_t> ChangedNumbersIn(const std::string& queue_path);
 
 }  // namespace ferrox::indexd

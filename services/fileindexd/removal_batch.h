@@ -9,7 +9,8 @@
 
 namespace ferrox::indexd {
 
-/// Has documents removed by a group's tasks, many at once. Belongs to one thread; what is not flushed stays.
+/// Collects paths whose documents are to be removed, and removes 500 at once by a task of the group, since each request
+/// to the index costs a round trip. Belongs to one thread. What is not flushed is not removed.
 class RemovalBatch {
  public:
   RemovalBatch(TaskGroup& tasks, DocumentWriter& writer, bool and_below)

@@ -25,7 +25,7 @@ IndexedEntry ToEntry(const Json::Value& fields) {
   GetJsonValue(entry.content_type, fields, elastic::kKOVAMDContentType, false);
   GetJsonValue(entry.extract_version, fields, elastic::k_KOVAExtractVersion, false);
   entry.extract_failed = fields.isMember(elastic::k_KOVAExtractError);
-  entry.cut_untold = fields.isMember(elastic::k_KOVATextCut) && !entry.extract_failed;
+  entry.cut_without_reason = fields.isMember(elastic::k_KOVATextCut) && !entry.extract_failed;
   return entry;
 }
 

@@ -10,40 +10,46 @@
 
 namespace ferrox::indexd {
 
-/// What the index knows of one document.
+/// What the index knows of one document: enough to tell, with lstat alone, whether the file is to be read again.
 struct IndexedEntry {
   std::string path;
-  std::string stamp;
+  std::string stamp;  ///< size, times and inode of the file when the document was written (kova/content_extract.h)
   bool with_content = false;  ///< whether its content was wanted when it was written
   std::string content_type = {};
-  int extract_version = 0;      ///< of what read its content; 0: nothing did
-  bool extract_failed = false;  ///< its content, or a part of it, could not be read
-  bool cut_untold = false;      ///< written when a text that is cut was no reason to say so
+  int extract_version = 0;          ///< of what read its content; 0: nothing did
+  bool extract_failed = false;      ///< its content, or a part of it, could not be read
+  bool cut_without_reason = false;  ///< its text was cut, and it has no failure that says so: an early version wrote it
 };
 
-/// One share's index, as the daemon's work needs it; every call may throw what the engine's commands do. Several
-/// threads may call at once.
+/// One share's index, as the daemon's work needs it. The one implementation asks the engine over its socket; tests have
+/// one in memory. Every call blocks for the engine's answer and may throw what its commands do. Several threads may
+/// call at once.
 class ShareIndex {
  public:
   virtual ~ShareIndex() = default;
 
   /// Whether the index exists.
   virtual bool Exists() = 0;
-  /// Makes it when it is missing; replaces one of the same name that lies elsewhere.
+  /// Makes a missing index; replaces one of the same name that lies elsewhere.
   virtual void Create() = 0;
-  /// What tells the present rebuilding of the index, which the engine has made anew and which is to be filled, from
-  /// others; 0 for an index that is complete.
+  /// The number of the present rebuilding: the engine has made the index anew, and it is to be filled. Another
+  /// rebuilding has another number; 0 for an index that is complete.
   virtual int64_t Rebuilding() = 0;
   /// That rebuilding is complete; nothing happens when another has begun meanwhile.
   virtual void EndRebuilding(int64_t which) = 0;
   /// Ends a pause of the index.
   virtual void Resume() = 0;
+  /// Writes the document of the file at `path`; `need_meta`: reads its content, too. @throws Error kParseFailed when
+  /// the file is gone, or content extraction does not work.
   virtual void Upsert(const std::string& path, bool need_meta) = 0;
+  /// Replaces what name and lstat say of the file; leaves the content. @throws Error kEngineNoSuchDocument.
   virtual void Attr(const std::string& path) = 0;
   /// Removes the documents at the paths, and, with `and_below`, all below them; in one request. Missing ones are no
   /// error.
   virtual void Delete(const std::vector<std::string>& paths, bool and_below) = 0;
+  /// Moves the document at the old path and all below it. @throws Error kEngineNoSuchDocument.
   virtual void Rename(const std::string& new_path, const std::string& old_path) = 0;
+  /// Returns when everything before it would survive a power cut.
   virtual void Commit() = 0;
   /// At most `limit` documents below `folder`, in byte order of their paths, those after `after` when it is not "".
   virtual std::vector<IndexedEntry> List(const std::string& folder, const std::string& after, unsigned limit) = 0;
@@ -59,7 +65,7 @@ class ShareIndex {
   virtual Json::Value Figures(std::chrono::milliseconds longest) = 0;
 };
 
-/// The shares of which the engine says that their index is being rebuilt; none when it does not answer at once.
+/// The shares of which the engine says that their index is being rebuilt; none when it does not answer within 2 s.
 std::vector<std::string> SharesBeingRebuilt();
 
 /// The index of `share` in the search engine.

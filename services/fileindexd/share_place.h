@@ -10,13 +10,13 @@
 
 namespace ferrox::indexd {
 
-/// Whether something is mounted on a folder: 1, 0, or below 0 when that cannot be told.
+/// Whether something is mounted on a folder: 1, 0, or below 0 when the system cannot say.
 using IsMountPoint = std::function<int(const std::string& path)>;
 
 /// Where something is mounted below a folder, in ascending order.
 using MountsBelow = std::function<std::vector<std::string>(const std::string& folder)>;
 
-/// For those who know of none.
+/// The same for a host that has no such question.
 inline int NothingMounted(const std::string&) { return 0; }
 inline std::vector<std::string> NoMounts(const std::string&) { return {}; }
 
@@ -28,10 +28,11 @@ std::string MountPointOf(const std::string& folder, const IsMountPoint& is_mount
 /// nothing speaks against it; a folder with content is where the share is now, mounted or not.
 std::string AbsenceOf(const std::string& root, const std::string& mount_point, const IsMountPoint& is_mount_point);
 
-/// Holds on to the folder that a path leads to: it cannot be unmounted meanwhile but by force, and it can be told
-/// whether the path still leads there.
+/// Holds an open descriptor of the folder at a path while it lives: its volume cannot be unmounted meanwhile but by
+/// force, and IsStillThere finds out whether the path still leads to the same folder.
 class HeldFolder {
  public:
+  /// `path` outlives it. A folder that cannot be opened is not there.
   explicit HeldFolder(const std::string& path);
   bool IsStillThere() const;
   /// @throws Error kPathNotIndexable when it does not: what was not found there may be anywhere.

@@ -24,20 +24,20 @@ constexpr int kClearedByReindex = StatusMgr::kNeedReindex | StatusMgr::kSecondCo
 void ShareRound::Run() {
   served_sync_ = context_.syncs.Last();
   availability_.Check();
-  QueueWhatNobodyQueues();
+  PrepareIndexAndQueue();
   RunPasses();
   keeper_.FinishRebuilding();
 }
 
-/// The index is ready afterwards, and what is to be done without anybody's event is queued.
-void ShareRound::QueueWhatNobodyQueues() {
+/// Makes sure of the index, and queues what is to be done although no other process queues an event for it.
+void ShareRound::PrepareIndexAndQueue() {
   if (availability_.WasAway()) (void)context_.queue.Add(fileindex::EVENT_REINDEX, context_.root);
   availability_.ClearAway();
   const ShareFolders folders = context_.folders.Load();
   keeper_.EnsureExists(
       retry_.HasFailedFor(Error::kEngineNoSuchIndex, context_.environment.patience, steady_clock::now()));
   keeper_.FollowRebuilding();
-  // That shares in this one came or went is nobody's event; a pass compares their folders.
+  // No event says that indexed shares in this one came or went; a pass compares their folders.
   const bool is_queued = context_.queue.HasLines() || context_.queue.IsDetached();
   if (!is_queued && folders.DiffersInInnerAlone(context_.applied.Get())) {
     (void)context_.queue.Add(kPassEvent, context_.root);

@@ -31,7 +31,7 @@ class ShareRound {
   uint64_t ServedSync() const { return served_sync_; }
 
  private:
-  void QueueWhatNobodyQueues();
+  void PrepareIndexAndQueue();
   void RunPasses();
   void QueueNeededReindex();
   void Gather();

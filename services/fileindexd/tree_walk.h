@@ -12,7 +12,7 @@
 
 namespace ferrox::indexd {
 
-/// What a walk leaves out, and whom it tells.
+/// What a walk leaves out, and where it reports problems. The functions are called by the walking thread.
 struct WalkRules {
   /// What a path is for the walk: entries outside are left out, with what is below; a folder on the way is entered, but
   /// not returned. Not asked below an indexed folder, where all is indexed.
@@ -24,13 +24,13 @@ struct WalkRules {
   /// Whether a folder found below one on the device `parent_device` may be entered; asked once per folder.
   std::function<bool(const std::string& path, const struct stat& status, dev_t parent_device)> may_enter =
       [](const std::string&, const struct stat&, dev_t) { return true; };
-  /// What could not be read, and errno.
+  /// Called for what could not be read, with errno's value.
   std::function<void(const std::string& path, int error)> on_problem = [](const std::string&, int) {};
 };
 
 /// Walks a folder in the byte order of full paths, the order in which the index lists its documents: the entries of a
 /// folder are sorted by name, and what lies in a subfolder sorts as if the subfolder's name ended in "/". Links are not
-/// followed and not returned. Holds the names of one folder a level in memory.
+/// followed and not returned. Holds an open descriptor and the names of one folder for each level of the tree.
 class TreeWalk {
  public:
   struct Entry {

@@ -27,15 +27,19 @@ constexpr char kHelp[] =
     "  --version     the version\n"
     "The environment variable FERROX_ROOT chooses the instance.\n";
 
-constexpr std::chrono::milliseconds kLookEvery(1000);
+constexpr std::chrono::milliseconds kCheckInterval(1000);
+/// The least time between two starts of a service: doubles from the first to the second while the service keeps dying.
 constexpr std::chrono::seconds kPauseMin(1), kPauseMax(60);
 
-/// One service. The pause between two starts doubles until it has run for longer than the longest one.
-class Watched {
+/// One daemon of the instance, which is started again when its process has ended without 'fileindexctl down' or a
+/// signal to stop. Its pid file tells (platform/host/child_service.h), so that the daemons need not be children.
+class SupervisedService {
  public:
-  explicit Watched(const ServiceRow& service) : service_(&service) {}
+  explicit SupervisedService(const ServiceRow& service) : service_(&service) {}
 
-  void Look() {
+  /// Called every second. Also keeps the service's log file within its bounds, which nothing else does where no service
+  /// manager takes the log. A service that has run for longer than the longest pause starts anew with the shortest.
+  void Check() {
     kova::host::BoundLog(kova::host::ServiceLogPath(service_->program));
     if (SteadyClock::now() < next_ || !kova::host::HasChildServiceDied(*service_)) return;
     if (SteadyClock::now() - next_ > kPauseMax) pause_ = kPauseMin;
@@ -49,18 +53,19 @@ class Watched {
 
  private:
   const ServiceRow* service_;
-  SteadyClock::time_point next_ = SteadyClock::now();
+  SteadyClock::time_point next_ = SteadyClock::now();  ///< no start before
   std::chrono::seconds pause_ = kPauseMin;
 };
 
+/// Returns when it is told to stop, or when its pid file is gone: the folder of the instance was removed, and with it
+/// what there was to supervise.
 void Supervise() {
   ferrox::services::Daemon daemon(kova::host::kSupervisor.program);
-  std::vector<Watched> services(kova::host::ChildServices().begin(), kova::host::ChildServices().end());
+  std::vector<SupervisedService> services(kova::host::ChildServices().begin(), kova::host::ChildServices().end());
   daemon.NotifyReady();
   pollfd stop = {daemon.StopFd(), POLLIN, 0};
-  // Whoever removes the folder of an instance has no other use for it.
-  while (poll(&stop, 1, static_cast<int>(kLookEvery.count())) <= 0 && daemon.HasPidFile()) {
-    for (Watched& service : services) service.Look();
+  while (poll(&stop, 1, static_cast<int>(kCheckInterval.count())) <= 0 && daemon.HasPidFile()) {
+    for (SupervisedService& service : services) service.Check();
   }
 }
 

@@ -49,7 +49,7 @@ TEST_F(ShareWorkerTest, RenamesReadNoFilesAndKindsOfFilesMayChange) {
 }
 
 TEST_F(ShareWorkerTest, ReindexTouchesOnlyWhatDiffers) {
-  for (int i = 0; i < 2500; ++i) test::WriteFile(At("d" + std::to_string(i % 7) + "/f" + std::to_string(i)), "x");
+  for (int i = 0; i < 1100; ++i) test::WriteFile(At("d" + std::to_string(i % 7) + "/f" + std::to_string(i)), "x");
   Process(Line(kReindex, root));
   index->upserts.clear();
   test::WriteFile(At("d3/f3"), "changed");
@@ -293,6 +293,7 @@ TEST_F(ShareWorkerTest, PausedIndexIsResumedWhenNoFolderIsPaused) {
   WaitForState("paused");
   EXPECT_TRUE(index->paused);
   SetFolders({{"", "davp"}});
+  worker->Wake();
   WaitForState("idle");
 }
 
