@@ -66,6 +66,7 @@ class Notifier : private WatchSet::Listener {
     TimePoint expire = TimePoint::max();  ///< the sync requests
   };
 
+  // From the WatchSet: what goes on to the router and to the syncs.
   void OnChange(Change change) override;
   void OnCompare(const std::string& path) override;
   void OnLost(size_t way) override;

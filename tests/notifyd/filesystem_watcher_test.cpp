@@ -60,12 +60,12 @@ class FilesystemWatcherTest : public testing::Test {
     watcher_->Add({Root()});
     while (watcher_->Advance(std::chrono::milliseconds(10), notes_)) {
     }
-    const std::vector<std::string> told = notes_.Take();
-    if (!told.empty() && told[0].compare(0, 7, "refused") == 0) GTEST_SKIP() << told[0];
-    ASSERT_THAT(told, ElementsAre("covered r"));
+    const std::vector<std::string> reported = notes_.Take();
+    if (!reported.empty() && reported[0].compare(0, 7, "refused") == 0) GTEST_SKIP() << reported[0];
+    ASSERT_THAT(reported, ElementsAre("covered r"));
   }
 
-  std::vector<std::string> Told() {
+  std::vector<std::string> Reported() {
     while (watcher_->Read(notes_)) {
     }
     return notes_.Take();
@@ -99,7 +99,7 @@ TEST_F(FilesystemWatcherTest, TellsWhatHappened) {
   struct Row {
     const char* what;
     std::function<void()> act;
-    std::vector<std::string> told;
+    std::vector<std::string> reported;
   };
   const std::vector<Row> rows = {
       {"new file", [&] { WriteFile(root + "/f", "1"); }, {"created r/f", "written r/f"}},
@@ -141,15 +141,15 @@ TEST_F(FilesystemWatcherTest, TellsWhatHappened) {
   for (const Row& row : rows) {
     SCOPED_TRACE(row.what);
     row.act();
-    EXPECT_THAT(Told(), ElementsAreArray(row.told));
+    EXPECT_THAT(Reported(), ElementsAreArray(row.reported));
   }
   EXPECT_EQ(watcher_->Watches(Root()), 1U);
   watcher_->Remove(Root());
   WriteFile(dir_ / "s/f", "1");
-  EXPECT_THAT(Told(), IsEmpty());
+  EXPECT_THAT(Reported(), IsEmpty());
 }
 
-TEST_F(FilesystemWatcherTest, AFileIsToldByItsNumberWhenItsNameTellsNothingOfTheOthers) {
+TEST_F(FilesystemWatcherTest, AFileIsReportedByItsNumberWhenItsNameTellsNothingOfTheOthers) {
   const std::string a = Root() + "/a";
   const std::string inside = Root() + "/b";
   const std::string outside = dir_ / "b";
@@ -160,7 +160,7 @@ TEST_F(FilesystemWatcherTest, AFileIsToldByItsNumberWhenItsNameTellsNothingOfThe
   struct Row {
     const char* what;
     std::function<void()> act;
-    bool told;
+    bool reported;
   };
   const std::vector<Row> rows = {
       {"new", [&] { WriteFile(a, "1"); }, false},
@@ -178,32 +178,32 @@ TEST_F(FilesystemWatcherTest, AFileIsToldByItsNumberWhenItsNameTellsNothingOfThe
     SCOPED_TRACE(row.what);
     notes_.numbers.clear();
     row.act();
-    const std::vector<std::string> told = Told();
+    const std::vector<std::string> reported = Reported();
     struct stat status = {};
     (void)(stat(a.c_str(), &status) == 0 || stat(inside.c_str(), &status) == 0);
     const std::set<uint64_t> number = {status.st_ino};
-    EXPECT_EQ(notes_.numbers, row.told ? number : std::set<uint64_t>()) << testing::PrintToString(told);
+    EXPECT_EQ(notes_.numbers, row.reported ? number : std::set<uint64_t>()) << testing::PrintToString(reported);
   }
 }
 
-TEST_F(FilesystemWatcherTest, NamesInDoubtAreToldWhenTheKernelJoinsRecords) {
+TEST_F(FilesystemWatcherTest, NamesInDoubtAreReportedWhenTheKernelJoinsRecords) {
   const std::string a = Root() + "/a";
   const std::string b = Root() + "/b";
   fs::create_directory(a);
-  (void)Told();
+  (void)Reported();
   for (const auto& [from, to] : {std::pair(a, b), {b, a}, {a, b}}) fs::rename(from, to);
   WriteFile(b + "/f", "");
-  const std::vector<std::string> told = Told();
-  EXPECT_THAT(told, testing::IsSupersetOf({"uncertain r/a", "uncertain r/b"}));
+  const std::vector<std::string> reported = Reported();
+  EXPECT_THAT(reported, testing::IsSupersetOf({"uncertain r/a", "uncertain r/b"}));
   WriteFile(b + "/g", "");
-  EXPECT_THAT(Told(), ElementsAre("created r/b/g", "written r/b/g")) << "the folder was looked for";
+  EXPECT_THAT(Reported(), ElementsAre("created r/b/g", "written r/b/g")) << "the folder was looked for";
 }
 
-TEST_F(FilesystemWatcherTest, AnOverflowIsToldAndThenAllIsCoveredAgain) {
+TEST_F(FilesystemWatcherTest, AnOverflowIsReportedAndThenAllIsCoveredAgain) {
   for (int i = 0; i < 20000; ++i) (void)mknod((Root() + "/f" + std::to_string(i)).c_str(), S_IFREG | 0600, 0);
-  EXPECT_THAT(Told(), testing::IsSupersetOf({"lost", "disturbed r", "covered r"}));
+  EXPECT_THAT(Reported(), testing::IsSupersetOf({"lost", "disturbed r", "covered r"}));
   WriteFile(Root() + "/f1", "1");
-  EXPECT_THAT(Told(), ElementsAre("written r/f1"));
+  EXPECT_THAT(Reported(), ElementsAre("written r/f1"));
 }
 
 TEST_F(FilesystemWatcherTest, TooMuchThatWaitsInMemoryCountsAsLost) {
@@ -213,7 +213,7 @@ TEST_F(FilesystemWatcherTest, TooMuchThatWaitsInMemoryCountsAsLost) {
   Watch(options);
   if (IsSkipped()) return;
   for (int i = 0; i < 3000; ++i) (void)mknod((Root() + "/d/f" + std::to_string(i)).c_str(), S_IFREG | 0600, 0);
-  EXPECT_THAT(Told(), testing::IsSupersetOf({"lost", "disturbed r", "covered r"}));
+  EXPECT_THAT(Reported(), testing::IsSupersetOf({"lost", "disturbed r", "covered r"}));
 }
 
 /// Elsewhere, other programs that write to the same file system would wake it.
@@ -252,7 +252,7 @@ class BelievedTree {
         if (change.is_folder && !is_strict) in_doubt_.insert(change.path);  // the other half of an exchange is full
         break;
       case Change::Kind::kDeleted:
-        Erase(change.path);  // of what was made and removed at once, only the latter is told
+        Erase(change.path);  // of what was made and removed at once, only the latter is reported
         break;
       case Change::Kind::kRenamed:
         if (is_strict && names_.count(change.old_path) == 0) return "not there: " + change.old_path;
@@ -320,7 +320,7 @@ void FilesystemWatcherTest::MakeChanges(unsigned seed, bool fresh_names) {
   while (waitpid(child, nullptr, WNOHANG) == 0) (void)watcher_->Read(notes_);
 }
 
-TEST_F(FilesystemWatcherTest, ReplayOfWhatIsToldGivesTheTree) {
+TEST_F(FilesystemWatcherTest, ReplayOfWhatIsReportedGivesTheTree) {
   for (unsigned seed = 0; seed < 12; ++seed) {
     const bool is_strict = seed % 2 == 0;
     SCOPED_TRACE("seed " + std::to_string(seed));
@@ -330,7 +330,7 @@ TEST_F(FilesystemWatcherTest, ReplayOfWhatIsToldGivesTheTree) {
     if (IsSkipped()) return;
     notes_.changes.clear();
     MakeChanges(seed, is_strict);
-    (void)Told();
+    (void)Reported();
     BelievedTree tree;
     for (const Change& change : notes_.changes) ASSERT_EQ(tree.Apply(change, is_strict), "");
     tree.LookAtWhatIsInDoubt();
@@ -354,7 +354,7 @@ TEST_F(FilesystemWatcherTest, AVolumeCanBeUnmountedAndComesAgain) {
     (void)watcher_->Advance(std::chrono::milliseconds(10), notes_);
     EXPECT_THAT(notes_.Take(), ElementsAre("covered volume/share"));
     WriteFile(volume + "/share/sub/f", "1");
-    EXPECT_THAT(Told(), ElementsAre("created volume/share/sub/f", "written volume/share/sub/f"));
+    EXPECT_THAT(Reported(), ElementsAre("created volume/share/sub/f", "written volume/share/sub/f"));
     ASSERT_EQ(umount(volume.c_str()), 0) << strerror(errno);
   }
 }

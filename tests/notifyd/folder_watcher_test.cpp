@@ -119,31 +119,31 @@ class FolderWatcherTest : public testing::TestWithParam<const char*> {
 INSTANTIATE_TEST_SUITE_P(Ports, FolderWatcherTest, testing::Values("inotify", "inode"),
                          [](const auto& port) { return std::string(port.param); });
 
-TEST_P(FolderWatcherTest, AFileIsToldByItsNumberWhenItsNameMayTellNothingOfTheOthers) {
+TEST_P(FolderWatcherTest, AFileIsReportedByItsNumberWhenItsNameMayTellNothingOfTheOthers) {
   WriteFile(root_ + "/a", "1");
   Cover();
   struct stat status = {};
   ASSERT_EQ(stat((root_ + "/a").c_str(), &status), 0);
   const std::set<uint64_t> number = {status.st_ino};
   const std::set<uint64_t> only_inode = IsInotify() ? std::set<uint64_t>() : number;
-  const auto told = [this](const std::function<void()>& act) {
+  const auto reported = [this](const std::function<void()>& act) {
     act();
     Settle();
     return std::exchange(seen_.numbers, {});
   };
   const std::string name = root_ + "/b";
   const auto write = [&] { fs::create_hard_link(root_ + "/a", name), WriteFile(name, "2"); };
-  EXPECT_THAT(told([&] { WriteFile(root_ + "/a", "3"), WriteFile(root_ + "/new", "4"); }), IsEmpty());
-  EXPECT_EQ(told(write), number);
+  EXPECT_THAT(reported([&] { WriteFile(root_ + "/a", "3"), WriteFile(root_ + "/new", "4"); }), IsEmpty());
+  EXPECT_EQ(reported(write), number);
   fs::remove(name);
-  EXPECT_EQ(told([&] { write(), fs::remove(name); }), only_inode);
-  EXPECT_EQ(told([&] { write(), fs::rename(name, dir_ / "out"), fs::remove(dir_ / "out"); }), only_inode);
+  EXPECT_EQ(reported([&] { write(), fs::remove(name); }), only_inode);
+  EXPECT_EQ(reported([&] { write(), fs::rename(name, dir_ / "out"), fs::remove(dir_ / "out"); }), only_inode);
 }
 
 struct Row {
   const char* claim;
   std::function<void(const std::string& root)> act;
-  std::vector<std::string> told;  ///< without "modified", which comes once or several times
+  std::vector<std::string> reported;  ///< without "modified", which comes once or several times
 };
 
 void Rename(const std::string& from, const std::string& to) { ASSERT_EQ(rename(from.c_str(), to.c_str()), 0); }
@@ -201,7 +201,7 @@ const Row kRows[] = {
      {"deleted r/old/f", "deleted r/old/"}},
 };
 
-TEST_P(FolderWatcherTest, ChangesAreToldWithThePathsOfTheMoment) {
+TEST_P(FolderWatcherTest, ChangesAreReportedWithThePathsOfTheMoment) {
   for (const Row& row : kRows) {
     SCOPED_TRACE(row.claim);
     fs::remove_all(root_);
@@ -210,24 +210,24 @@ TEST_P(FolderWatcherTest, ChangesAreToldWithThePathsOfTheMoment) {
     MakeWatcher({});
     Cover();
     row.act(root_);
-    std::vector<std::string> told = SettleAndTake();
-    std::erase_if(told, [](const std::string& line) { return line.compare(0, 8, "modified") == 0; });
-    told.erase(std::unique(told.begin(), told.end()), told.end());
-    EXPECT_EQ(told, row.told);
+    std::vector<std::string> reported = SettleAndTake();
+    std::erase_if(reported, [](const std::string& line) { return line.compare(0, 8, "modified") == 0; });
+    reported.erase(std::unique(reported.begin(), reported.end()), reported.end());
+    EXPECT_EQ(reported, row.reported);
     EXPECT_EQ(seen_.model, OnDisk());
     ExpectAllIsWatched();
     fs::remove_all(dir_ / "out");
   }
 }
 
-TEST_P(FolderWatcherTest, EachFolderOfANewTreeIsToldAfterItIsWatched) {
+TEST_P(FolderWatcherTest, EachFolderOfANewTreeIsReportedAfterItIsWatched) {
   Cover();
   fs::create_directories(root_ + "/a/b/c");
   fs::create_directories(dir_ / "out/d/e");
   Rename(dir_ / "out", root_ + "/in");
-  const std::vector<std::string> told = SettleAndTake();
+  const std::vector<std::string> reported = SettleAndTake();
   for (const char* folder : {"a/", "a/b/", "a/b/c/", "in/", "in/d/", "in/d/e/"}) {
-    EXPECT_THAT(told, Contains("created r/" + std::string(folder)));
+    EXPECT_THAT(reported, Contains("created r/" + std::string(folder)));
   }
   ExpectAllIsWatched();
 }
@@ -279,7 +279,7 @@ TEST_P(FolderWatcherTest, RootsInEachOtherShareWatches) {
   EXPECT_EQ(watcher_->Watches(root_ + "/a"), 2U);
 }
 
-TEST_P(FolderWatcherTest, LostRecordsAreToldAndEverythingIsWatchedAgain) {
+TEST_P(FolderWatcherTest, LostRecordsAreReportedAndEverythingIsWatchedAgain) {
   Cover();
   fs::create_directories(root_ + "/a/b");
   uint64_t records = 0;
@@ -314,7 +314,7 @@ TEST_P(FolderWatcherTest, ARootThatMovesOrGoesIsDisturbed) {
   EXPECT_THAT(SettleAndTake(), Contains("refused r: No such file or directory"));
 }
 
-TEST_P(FolderWatcherTest, TheCookieIsToldInItsPlace) {
+TEST_P(FolderWatcherTest, TheCookieIsReportedInItsPlace) {
   const std::string cookie = dir_ / "cookies/cookie";
   Cover();
   Touch(root_ + "/before");

@@ -107,7 +107,7 @@ TEST_F(QueueRouterTest, ChangesOfOnePathThatWaitTogetherAreOneLine) {
   }
 }
 
-TEST_F(QueueRouterTest, TheMaskSaysWhichChangesAreTold) {
+TEST_F(QueueRouterTest, TheMaskSaysWhichChangesAreReported) {
   const std::vector<Change> changes = {Created("/v/a"), Written("/v/b"),         Attributes("/v/c"),
                                        Deleted("/v/d"), Renamed("/v/e", "/v/f"), {Kind::kUncertain, true, "/v/g"}};
   const struct {
@@ -167,7 +167,7 @@ TEST_F(QueueRouterTest, EachQueueHearsOfItsFolders) {
   }
 }
 
-TEST_F(QueueRouterTest, AFileThatStaysOpenIsToldWhenItIsQuietOrAfterSomeTime) {
+TEST_F(QueueRouterTest, AFileThatStaysOpenIsReportedWhenItIsQuietOrAfterSomeTime) {
   router_.SetQueues({{queue_, {{"/v", kAll}}}});
   const auto start = now_;
   const auto at = [&](int ms) { return now_ = start + milliseconds(ms); };
@@ -290,7 +290,7 @@ TEST_F(QueueRouterTest, TooManyLinesBecomeComparisonsOfFewFolders) {
   EXPECT_EQ(Lines(queue_), "10000 /top/ 10000 /v/wide/ 10000 /w/a/ 2 /v/single/file ");
 }
 
-TEST_F(QueueRouterTest, PathsThatNobodyCanOpenAreToldByTheFolderAboveThem) {
+TEST_F(QueueRouterTest, PathsThatNobodyCanOpenAreReportedByTheFolderAboveThem) {
   const std::string above = "/v/" + std::string(4000, 'd');
   const std::string deep = above + "/" + std::string(100, 'e');
   EXPECT_EQ(LinesOf({Created(deep, kFolder), Deleted(deep + "/f"), Written(above + "/f")}), "10000 " + above + "/ ");
@@ -311,7 +311,7 @@ TEST_F(QueueRouterTest, NamesWithAnyBytesReachTheReader) {
   EXPECT_EQ(event.path_old, old_path);
 }
 
-TEST_F(QueueRouterTest, FilesToldByNumberAreOneLineOrAComparison) {
+TEST_F(QueueRouterTest, FilesReportedByNumberAreOneLineOrAComparison) {
   const std::string numbered = LinesOf({Written("/v/a"), ByNumber(8), ByNumber(7), ByNumber(8)});
   EXPECT_EQ("2 /v/a 0 /v/ ", numbered);
   EXPECT_NE(std::string::npos, test::ReadFile(queue_).find(R"("data":{"files":[7,8]}})"));

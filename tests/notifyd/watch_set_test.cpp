@@ -19,7 +19,7 @@ namespace fs = std::filesystem;
 
 constexpr std::chrono::milliseconds kSlice{20};
 
-/// Two fake watchers, "best" and "next", and what is told of "/.../root", which is written "R" here.
+/// Two fake watchers, "best" and "next", and what is reported of "/.../root", which is written "R" here.
 class WatchSetTest : public testing::Test, public WatchSet::Listener {
  protected:
   WatchSetTest() {
@@ -34,8 +34,8 @@ class WatchSetTest : public testing::Test, public WatchSet::Listener {
   }
 
   void OnChange(Change) override {}
-  void OnCompare(const std::string& path) override { told_ += "compare " + path.substr(dir_.Path().size()) + " "; }
-  void OnLost(size_t) override { told_ += "lost "; }
+  void OnCompare(const std::string& path) override { reported_ += "compare " + path.substr(dir_.Path().size()) + " "; }
+  void OnLost(size_t) override { reported_ += "lost "; }
   void OnCookie(size_t) override {}
 
   void Follow(const std::vector<std::string>& paths) {
@@ -51,14 +51,14 @@ class WatchSetTest : public testing::Test, public WatchSet::Listener {
     set_->Examine();
     Advance();
   }
-  std::string Told() { return std::exchange(told_, {}); }
+  std::string Reported() { return std::exchange(reported_, {}); }
   WatchState State() const { return set_->StateOf({root_}); }
 
   const test::TempDir dir_;
   const std::string root_ = fs::canonical(dir_.Path()).string() + "/root";
   std::vector<FakeWatcher*> fakes_;
   std::unique_ptr<WatchSet> set_;
-  std::string told_;
+  std::string reported_;
 };
 
 TEST_F(WatchSetTest, TheFirstWayThatDoesNotRefuseIsTakenAndTheReasonsAreKept) {
@@ -82,7 +82,7 @@ TEST_F(WatchSetTest, TheFirstWayThatDoesNotRefuseIsTakenAndTheReasonsAreKept) {
     EXPECT_EQ(State().way, row.way);
     EXPECT_EQ(State().reason, row.reason);
     EXPECT_EQ(State().covered, row.covered);
-    EXPECT_NE(Told(), "") << "what is covered is compared, whatever the way";
+    EXPECT_NE(Reported(), "") << "what is covered is compared, whatever the way";
   }
 }
 
@@ -98,33 +98,33 @@ TEST_F(WatchSetTest, WithoutScansAFolderThatAllRefuseIsAProblem) {
   EXPECT_EQ(set.Roots().Problems(),
             (std::vector<std::string>{"changes of " + root_ + " are not noticed: only: is full; " +
                                       "periodic scan: switched off in the settings"}));
-  EXPECT_EQ(Told(), "");
+  EXPECT_EQ(Reported(), "");
   EXPECT_FALSE(set.Roots().HasMissing()) << "there is nothing to look for every few seconds";
 }
 
 TEST_F(WatchSetTest, ARefusalLaterMovesAFolderToTheNextWay) {
   Follow({root_});
-  EXPECT_EQ(Told(), "compare /root ");
+  EXPECT_EQ(Reported(), "compare /root ");
   fakes_[0]->Say([this](WatchListener& listener) { listener.OnRefused(root_, "is full now"); });
   EXPECT_TRUE(set_->Read(0));
   Advance();
   EXPECT_EQ(State().way, "next");
-  EXPECT_EQ(Told(), "compare /root ");
+  EXPECT_EQ(Reported(), "compare /root ");
   fakes_[0]->Say([this](WatchListener& listener) { listener.OnCovered(root_); });
   (void)set_->Read(0);
-  EXPECT_EQ(Told(), "") << "the former watcher has no say any more";
+  EXPECT_EQ(Reported(), "") << "the former watcher has no say any more";
 }
 
 TEST_F(WatchSetTest, LostChangesAreComparedWhenAllIsWatchedAgain) {
   Follow({root_});
-  (void)Told();
+  (void)Reported();
   fakes_[0]->Say([](WatchListener& listener) { listener.OnLost(); });
   (void)set_->Read(0);
-  EXPECT_EQ(Told(), "lost ");
+  EXPECT_EQ(Reported(), "lost ");
   EXPECT_TRUE(set_->Roots().IsSettingUp());
   fakes_[0]->Say([this](WatchListener& listener) { listener.OnCovered(root_); });
   (void)set_->Read(0);
-  EXPECT_EQ(Told(), "compare /root ");
+  EXPECT_EQ(Reported(), "compare /root ");
   EXPECT_FALSE(set_->Roots().IsSettingUp());
 }
 
@@ -146,14 +146,14 @@ TEST_F(WatchSetTest, WhatIsNoFolderIsWaitedFor) {
     EXPECT_EQ(State().way, "none");
     EXPECT_EQ(State().reason, row.what);
     EXPECT_TRUE(set_->Roots().HasMissing());
-    EXPECT_EQ(Told(), "") << "it may be on a volume that is not there yet";
+    EXPECT_EQ(Reported(), "") << "it may be on a volume that is not there yet";
     fs::remove(root_);
     fs::create_directory(root_);
     Examine();
     EXPECT_EQ(State().way, "best");
-    EXPECT_EQ(Told(), "compare /root ");
+    EXPECT_EQ(Reported(), "compare /root ");
     Examine();
-    EXPECT_EQ(Told(), "") << "nothing changed";
+    EXPECT_EQ(Reported(), "") << "nothing changed";
   }
 }
 
@@ -166,23 +166,23 @@ TEST_F(WatchSetTest, AFolderReachedThroughALinkIsNotWatched) {
 
 TEST_F(WatchSetTest, ARemovedFolderIsComparedAndAReplacedOneWatchedAnew) {
   Follow({root_});
-  (void)Told();
+  (void)Reported();
   fs::remove(root_);
   Examine();
-  EXPECT_EQ(Told(), "compare /root ") << "its volume is still there";
+  EXPECT_EQ(Reported(), "compare /root ") << "its volume is still there";
   Examine();
-  EXPECT_EQ(Told(), "") << "once";
+  EXPECT_EQ(Reported(), "") << "once";
   fs::create_directory(root_);
   Examine();
-  EXPECT_EQ(Told(), "compare /root ");
+  EXPECT_EQ(Reported(), "compare /root ");
   fs::rename(root_, dir_ / "aside");
   fs::create_directory(root_);
   Examine();
-  EXPECT_EQ(Told(), "compare /root ");
+  EXPECT_EQ(Reported(), "compare /root ");
   fs::remove(root_);
   fs::create_directory(root_);
   Examine();
-  EXPECT_EQ(Told(), "compare /root ") << "also when the new one has the same number";
+  EXPECT_EQ(Reported(), "compare /root ") << "also when the new one has the same number";
   const std::string again = "-" + root_ + " +" + root_ + " ";
   EXPECT_EQ(fakes_[0]->Calls(), "+" + root_ + " " + again + again + again);
 }
@@ -191,15 +191,15 @@ TEST_F(WatchSetTest, AFolderInACoveredOneNeedsNoWatchOfItsOwnUntilItIsGone) {
   const std::string inner = root_ + "/inner";
   fs::create_directory(inner);
   Follow({root_});
-  (void)Told();
+  (void)Reported();
   Follow({root_, inner});
   EXPECT_EQ(fakes_[0]->Calls(), "+" + root_ + " ");
   EXPECT_TRUE(set_->StateOf({inner}).covered);
-  EXPECT_EQ(Told(), "compare /root/inner ") << "it may have changed since its application looked";
+  EXPECT_EQ(Reported(), "compare /root/inner ") << "it may have changed since its application looked";
   fs::remove(inner);
   Examine();
   EXPECT_EQ(set_->StateOf({inner}).reason, "is missing");
-  EXPECT_EQ(Told(), "") << "the outer folder's watcher tells";
+  EXPECT_EQ(Reported(), "") << "the outer folder's watcher tells";
 }
 
 /// The rows' folders are "path ignored,ignored"; what is expected are the roots in that form.
@@ -249,12 +249,12 @@ TEST(MountTableTest, TellsWhatLiesOnWhatAndWhatIsBehindANetwork) {
 
 class MountTest : public WatchSetTest {
  protected:
-  /// What is told after each of: mounted, unmounted, mounted again, unmounted and mounted at once.
+  /// What is reported after each of: mounted, unmounted, mounted again, unmounted and mounted at once.
   std::string Walk(const std::string& root) {
-    std::string told;
+    std::string reported;
     const auto step = [&](const char* name, bool done) {
       Examine();
-      told += std::string(name) + (done ? ": " : " failed: ") + Told();
+      reported += std::string(name) + (done ? ": " : " failed: ") + Reported();
     };
     const auto mounted = [&] {
       return mount("none", root_.c_str(), "tmpfs", 0, nullptr) == 0 && (fs::create_directories(root), true);
@@ -265,14 +265,14 @@ class MountTest : public WatchSetTest {
     step("unmounted", umount(root_.c_str()) == 0);
     step("again", mounted());
     step("at once", umount(root_.c_str()) == 0 && mounted());
-    return told;
+    return reported;
   }
 };
 
 TEST_F(MountTest, AVolumeThatGoesIsNoDeletionAndOneThatComesIsCompared) {
   for (const std::string name : {"", "/share"}) {
-    const std::string told = "compare /root" + name + " ";
-    const std::string all = "mounted: " + told + "unmounted: again: " + told + "at once: " + told;
+    const std::string reported = "compare /root" + name + " ";
+    const std::string all = "mounted: " + reported + "unmounted: again: " + reported + "at once: " + reported;
     if (!test::InChild(true, [&] { EXPECT_EQ(Walk(root_ + name), all); })) GTEST_SKIP() << "no right to mount";
   }
 }
@@ -282,13 +282,13 @@ TEST_F(MountTest, WhatAMountBelowAFolderHidesAndShowsAgainIsCompared) {
   fs::create_directories(point + "/registered");
   const auto walk = [&](const std::vector<std::string>& registered) {
     Follow(registered);
-    (void)Told();
-    std::string told = mount("none", point.c_str(), "tmpfs", 0, nullptr) == 0 ? "" : "failed ";
+    (void)Reported();
+    std::string reported = mount("none", point.c_str(), "tmpfs", 0, nullptr) == 0 ? "" : "failed ";
     Examine();
-    told += "mounted: " + Told();
+    reported += "mounted: " + Reported();
     (void)umount(point.c_str());
     Examine();
-    return told + "unmounted: " + Told();
+    return reported + "unmounted: " + Reported();
   };
   const std::string compared = "compare /root/sub/point ";
   if (!test::InChild(true, [&] {

@@ -21,9 +21,10 @@
 namespace ferrox::notifyd {
 
 /// Watches roots by one mark for each file system that has some, so that a root costs the same however many folders it
-/// has. The kernel then reports everything on the file system. What lies outside of all roots is dropped here, unless
-/// it may be a change of a file that has another name in a root (LinkedFiles); what lies in the daemons' own folders
-/// the kernel mostly leaves out (FilesystemMarks). Names to ignore are reported all the same.
+/// has. That takes CAP_SYS_ADMIN for the marks, and CAP_DAC_READ_SEARCH to open folders by the handles in records,
+/// which tell their paths. The kernel then reports everything on the file system. What lies outside of all roots is
+/// dropped here, unless it may be a change of a file that has another name in a root (LinkedFiles); what lies in the
+/// daemons' own folders the kernel mostly leaves out (FilesystemMarks). Names to ignore are reported all the same.
 ///
 /// Read takes records from the kernel (RecordQueue); FanRecordTranslator turns each into changes, with the paths of the
 /// moment of the record, however far the reader is behind (FolderLocator). Only a name to which something came back
@@ -40,6 +41,7 @@ class FilesystemWatcher : public Watcher {
   /// Opens nothing: what the kernel refuses is reported for each root.
   explicit FilesystemWatcher(const Options& options);
 
+  // As in Watcher:
   const char* Name() const override { return "fanotify"; }
   void Add(const WatchRoot& root) override;
   void Remove(const std::string& root) override;

@@ -9,13 +9,14 @@
 
 namespace ferrox::notifyd {
 
-/// Watches folders by marks of fanotify on their inodes, which needs no privileges. A folder's key is a hash of its
-/// file handle.
+/// Watches folders by marks of fanotify on their inodes, which needs no privileges, but Linux 5.17 and file systems
+/// with file handles. A folder's key is a hash of its handle. The kernel joins changes of one name in one record.
 class FanInodePort : public FolderPort {
  public:
   /// `group` is open and has no marks.
   explicit FanInodePort(FanGroup group) : group_(std::move(group)) {}
 
+  // As in FolderPort:
   const char* Name() const override { return "fanotify inode marks"; }
   Limit WatchLimit() const override;
   int Fd() const override { return group_.Fd(); }

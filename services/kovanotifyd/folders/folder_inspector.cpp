@@ -26,14 +26,14 @@ void FolderInspector::InspectNext(WatchListener& listener) {
 }
 
 void FolderInspector::ContinueWalk(WatchListener& listener) {
-  const std::string root = queue_.WalkedRoot();
-  if (const std::optional<Ref> next = queue_.TakeFromWalk(); next.has_value()) {
+  const std::string root = queue_.Walks().Root();
+  if (const std::optional<Ref> next = queue_.Walks().TakeFolder(); next.has_value()) {
     const Id id = tree_.Get(*next);
     std::vector<Ref> below;
     if (id != kNone && tree_.IsCovered(id)) (void)Inspect(id, true, below, listener);
-    return queue_.AddToWalk(root, below);  // the root may have been refused meanwhile
+    return queue_.Walks().AddFolders(root, below);  // the root may have been refused meanwhile
   }
-  queue_.EndWalk();
+  queue_.Walks().End();
   const Id id = roots_.FolderOf(root);
   if (id == kNone || tree_.Key(id) == 0) return roots_.Refuse(root, "it was moved or removed", listener);
   listener.OnCovered(root);

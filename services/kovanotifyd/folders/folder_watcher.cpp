@@ -57,7 +57,7 @@ void FolderWatcher::Step(WatchListener& listener) {
     inspector_.InspectNext(listener);
   } else if (queue_.TakeCookie()) {
     listener.OnCookie();
-  } else if (queue_.HasWalk()) {
+  } else if (queue_.Walks().HasAny()) {
     inspector_.ContinueWalk(listener);
   } else if (watches_.IsAllRead()) {
     queue_.OnAllRead();

@@ -15,6 +15,7 @@ class InotifyPort : public FolderPort {
   /// @return "", or why inotify is not available, with the remedy and without a full stop.
   std::string Open();
 
+  // As in FolderPort:
   const char* Name() const override { return "inotify"; }
   Limit WatchLimit() const override;
   int Fd() const override { return inotify_.Get(); }

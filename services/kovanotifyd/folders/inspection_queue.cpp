@@ -47,16 +47,16 @@ bool InspectionQueue::TakeCookie() {
   return true;
 }
 
-void InspectionQueue::StartWalk(const std::string& root, Ref folder) {
-  CancelWalk(root);
+void RootWalks::Start(const std::string& root, Ref folder) {
+  Cancel(root);
   walks_.push_back({root, {folder}});
 }
 
-void InspectionQueue::CancelWalk(const std::string& root) {
+void RootWalks::Cancel(const std::string& root) {
   std::erase_if(walks_, [&root](const Walk& walk) { return walk.root == root; });
 }
 
-std::optional<FolderTree::Ref> InspectionQueue::TakeFromWalk() {
+std::optional<FolderTree::Ref> RootWalks::TakeFolder() {
   std::vector<Ref>& ahead = walks_.front().ahead;
   if (ahead.empty()) return {};
   const Ref next = ahead.back();
@@ -64,7 +64,7 @@ std::optional<FolderTree::Ref> InspectionQueue::TakeFromWalk() {
   return next;
 }
 
-void InspectionQueue::AddToWalk(const std::string& root, const std::vector<Ref>& folders) {
+void RootWalks::AddFolders(const std::string& root, const std::vector<Ref>& folders) {
   if (walks_.empty() || walks_.front().root != root) return;
   std::vector<Ref>& ahead = walks_.front().ahead;
   ahead.insert(ahead.end(), folders.begin(), folders.end());

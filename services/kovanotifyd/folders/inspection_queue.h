@@ -10,6 +10,33 @@
 
 namespace ferrox::notifyd {
 
+/// Walks through all folders of a root, which set it up. They take place one after the other, in the order of Start.
+class RootWalks {
+ public:
+  using Ref = FolderTree::Ref;
+
+  /// Adds a walk that begins with the root's folder, in place of one through the same root.
+  void Start(const std::string& root, Ref folder);
+  void Cancel(const std::string& root);
+  bool HasAny() const { return !walks_.empty(); }
+
+  // Of the first walk:
+  const std::string& Root() const { return walks_.front().root; }
+  /// The next folder; nothing at the end of the walk.
+  std::optional<Ref> TakeFolder();
+  /// Adds folders that were found in a folder of the root, unless its walk was cancelled.
+  void AddFolders(const std::string& root, const std::vector<Ref>& folders);
+  void End() { walks_.pop_front(); }
+
+ private:
+  struct Walk {
+    std::string root;
+    std::vector<Ref> ahead;  ///< folders that were found and not yet inspected
+  };
+
+  std::deque<Walk> walks_;
+};
+
 /// What is to be compared with the disk (FolderInspector does that), and in which order: first single folders and names
 /// where the tree may be wrong, then the walks that set roots up. A name may have to wait until the kernel's records
 /// have all been read, when tree and disk are of the same moment; so may the report of the cookie, which comes after
@@ -49,7 +76,7 @@ class InspectionQueue {
 
   /// Whether a folder or name waits, for its turn or for the records.
   bool HasDoubts() const { return !in_doubt_.empty() || HasUrgent(); }
-  bool HasWork() const { return HasDoubts() || !walks_.empty() || cookie_ != Cookie::kNone; }
+  bool HasWork() const { return HasDoubts() || walks_.HasAny() || cookie_ != Cookie::kNone; }
   /// Folders and names that can be inspected now; the last one added is the first. Folders come before names.
   bool HasUrgent() const { return !folders_.empty() || !names_.empty(); }
   /// Nothing when only names are left.
@@ -61,30 +88,16 @@ class InspectionQueue {
   void DeferCookie() { cookie_ = Cookie::kAfterAllRead; }
   bool TakeCookie();
 
-  /// Begins a walk through all folders of a root, in place of one that is under way.
-  void StartWalk(const std::string& root, Ref folder);
-  void CancelWalk(const std::string& root);
-  /// Walks take place one after the other; the others of these calls are about the first one.
-  bool HasWalk() const { return !walks_.empty(); }
-  const std::string& WalkedRoot() const { return walks_.front().root; }
-  /// The next folder of the walk under way; nothing at its end.
-  std::optional<Ref> TakeFromWalk();
-  /// Adds folders to the walk through the root, unless it was cancelled.
-  void AddToWalk(const std::string& root, const std::vector<Ref>& folders);
-  void EndWalk() { walks_.pop_front(); }
+  RootWalks& Walks() { return walks_; }
 
  private:
-  struct Walk {
-    std::string root;
-    std::vector<Ref> ahead;  ///< folders that were found and not yet inspected
-  };
   /// What the report of a cookie waits for.
   enum class Cookie { kNone, kAfterAllRead, kAfterInspections };
 
   FolderTree& tree_;
   std::vector<Folder> folders_;  ///< for TakeFolder
   std::vector<Name> names_;      ///< for TakeName
-  std::deque<Walk> walks_;
+  RootWalks walks_;
   Cookie cookie_ = Cookie::kNone;
 
   // Since all records had last been read:

@@ -62,7 +62,7 @@ void RootLedger::Add(const WatchRoot& root) {
   tree_.Set(id, FolderTree::kRoot, true);
   roots_[root.path] = {root.ignore, tree_.RefOf(id)};
   MarkPassages();
-  queue_.StartWalk(root.path, tree_.RefOf(id));
+  queue_.Walks().Start(root.path, tree_.RefOf(id));
 }
 
 /// Where another root lies above, the folders stay watched; those that only the removed root did not ignore, or that it
@@ -73,7 +73,7 @@ void RootLedger::Remove(const std::string& root) {
   const Id id = tree_.Get(found->second.folder);
   const std::vector<std::string> ignore = std::move(found->second.ignore);
   roots_.erase(found);
-  queue_.CancelWalk(root);
+  queue_.Walks().Cancel(root);
   if (id == kNone) return;
   tree_.Set(id, FolderTree::kRoot, false);
   MarkPassages();
@@ -90,7 +90,7 @@ void RootLedger::Refuse(const std::string& root, const std::string& reason, Watc
 }
 
 void RootLedger::WalkAll() {
-  for (const auto& [path, root] : roots_) queue_.StartWalk(path, root.folder);
+  for (const auto& [path, root] : roots_) queue_.Walks().Start(path, root.folder);
 }
 
 std::vector<std::string> RootLedger::Paths() const {

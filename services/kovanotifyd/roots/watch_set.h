@@ -63,7 +63,7 @@ class WatchSet : private WatchListener {
   WatchSet(const WatchSet&) = delete;
   WatchSet& operator=(const WatchSet&) = delete;
 
-  /// Takes what is registered from now on. Nothing happens to roots that stay as they are.
+  /// Takes what is registered from now on, and examines all roots. Nothing else happens to those that stay as they are.
   void Follow(std::vector<Registration> registrations);
   /// Examines whether each root's folder is still the one that is watched, and whether there is one for roots that
   /// wait.
@@ -86,6 +86,7 @@ class WatchSet : private WatchListener {
   void Scan();
 
   const RootTable& Roots() const { return roots_; }
+  /// Of the root that covers the watch.
   WatchState StateOf(const QueueWatch& watch) const;
 
  private:
