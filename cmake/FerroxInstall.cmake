@@ -10,10 +10,10 @@ install(TARGETS fileindex platform_host kova_interface EXPORT fileindexTargets
 install(EXPORT fileindexTargets NAMESPACE fileindex:: DESTINATION ${package_folder})
 
 # Of the library's own headers, those that describe what libfileindex.so shows, and of base's, which it does not show,
-# those that have no source; the others are its own business.
+# those that these include: they have no source. The others are its own business.
 install(DIRECTORY ${CMAKE_SOURCE_DIR}/common ${CMAKE_SOURCE_DIR}/sdk DESTINATION ${header_folder}
         FILES_MATCHING PATTERN "*.h")
-foreach(header base/mutex base/path base/path_table base/scope_exit base/text base/thread_annotations base/unique_fd
+foreach(header base/path base/scope_exit base/text base/thread_annotations base/unique_fd
         fileindex/folder fileindex/folder_mgr fileindex/index_mgr fileindex/optree fileindex/queue_mgr fileindex/status_mgr fileindex/util
         fileindex/watch_list fileindex/folders/folder fileindex/folders/folder_mgr fileindex/operations/index_mgr
         fileindex/operations/operation_error

@@ -8,7 +8,9 @@
 namespace ferrox {
 
 /// Holds an flock on a file while it lives; the file is made when missing and never removed. Two holders exclude each
-/// other also within one process, so a thread must not take the exclusive lock on a path twice.
+/// other also within one process, so a thread must not take the exclusive lock on a path twice. The kernel gives the
+/// lock back when the process ends, however it ends. Programs that are run meanwhile do not inherit it; a child that is
+/// only forked does.
 class FERROX_EXPORT LockFile {
  public:
   /// Takes the lock, exclusive or shared. It counts as had only when the locked file is still the one at `path`, so
@@ -24,13 +26,13 @@ class FERROX_EXPORT LockFile {
   LockFile& operator=(const LockFile&) = delete;
   ~LockFile();
 
-  /// The locked file, open for reading.
+  /// The locked file, open for reading. Owned here; closing it elsewhere would give the lock back early.
   int Descriptor() const { return fd_; }
 
  private:
   LockFile() = default;
 
-  int fd_ = -1;
+  int fd_ = -1;  ///< the open file that has the lock; -1 only while one is being made
   std::string path_;
 };
 

@@ -13,13 +13,17 @@ namespace ferrox {
 using LogSink = void (*)(int priority, const char* line);
 
 /// Writes one line to the log, the system's unless SetLogSink chose another. `%m` stands for errno's text. Control
-/// characters are written as \xNN, so that no file name can forge a line; a line is cut at 8 KiB. Keeps errno.
+/// characters are written as \xNN, so that no file name can forge a line; a line is cut at 8 KiB. Keeps errno. Any
+/// thread may call it; 8 KiB of its stack are used, and it may block for as long as the sink does.
+///   Log(LOG_WARNING, "%s: cannot be read: %m", path.c_str());
 FERROX_EXPORT void Log(int priority, const char* format, ...) __attribute__((format(printf, 2, 3)));
 
-/// Replaces the log's sink for the whole process and returns the one before; null restores the system's.
+/// Replaces the log's sink for the whole process and returns the one before; null restores the system's. Never returns
+/// null. A line that another thread is writing meanwhile may still go to the sink before.
 FERROX_EXPORT LogSink SetLogSink(LogSink sink);
 
 /// Where a failure was noticed: `file` is the source's path or its module's name, `condition` the failed check as text.
+/// The texts are not copied and need live during the call alone; those of the macros below live for ever.
 struct FailSite {
   const char* file;
   int line;
@@ -27,7 +31,7 @@ struct FailSite {
   const char* condition;
 };
 
-/// The name of the module that `file` belongs to: its stem.
+/// The name of the module that `file` belongs to: its stem, which is "share" for "sdk/share.cpp". No suffix is needed.
 FERROX_EXPORT std::string ModuleName(const char* file);
 
 /// Logs "<module>:<line> (<pid>, <euid>) (<function>) Failed [<condition>], reason: <reason>" and, when `saved_errno`
@@ -42,7 +46,7 @@ FERROX_EXPORT void LogFailure(const FailSite& site, int saved_errno, const std::
 
 /// " [err: <text of the present errno>]", "" when it is 0: the end of a line that reports a failure.
 FERROX_EXPORT std::string ErrnoSuffix();
-/// The text of the present errno.
+/// The text of the present errno, for example "No space left on device". Any thread may call it.
 FERROX_EXPORT std::string ErrnoText();
 
 }  // namespace ferrox
@@ -53,8 +57,10 @@ FERROX_EXPORT std::string ErrnoText();
 #endif
 
 /// Logs the failure line for `condition` and throws Error(code, reason...) when it holds; with a Subject as the last
-/// argument, the SubjectError of it. The line shows `text`, for
-/// conditions that the log names otherwise than the source does.
+/// argument, the SubjectError of it. The line shows `text`, for conditions that the log names otherwise than the source
+/// does. The reason is composed only when the condition holds. errno is that of the condition, also in the line; set it
+/// to 0 before where it tells nothing. Sources that use these macros include <cerrno>:
+///   FERROX_FAIL_IF(0 > rename(from.c_str(), to.c_str()), Error::kInternal, "rename failed, reason=" + ErrnoText());
 #define FERROX_FAIL_IF_AS(condition, text, code, ...)                                                                 \
   do {                                                                                                                \
     if (condition) [[unlikely]] {                                                                                     \

@@ -7,14 +7,18 @@
 namespace ferrox {
 
 /// Where a fixed absolute path of the product lies in this instance: the path itself, or below the instance's root
-/// (FERROX_ROOT, kova/instance.h). The root is read once in the life of a process.
+/// (FERROX_ROOT, kova/instance.h). The root is read once in the life of a process. The path is put together as text;
+/// nothing is made or looked for on disk.
+///   const ferrox::LockFile lock(ferrox::InstancePath(ferrox::kFolderLockPath), true);
 FERROX_EXPORT std::string InstancePath(const char* fixed_path);
 
 /// The longest path that a Unix-domain socket can have, in bytes without the terminating zero. A longer root makes an
 /// instance unusable.
 constexpr size_t kSocketPathMaxBytes = 107;
 
-/// Why this instance's root cannot be used: a sentence with the remedy. Empty when it can.
+/// Why this instance's root cannot be used: a sentence with the remedy. Empty when it can. A root must be absolute, and
+/// so short that the longest of the sockets' paths below still fits. Programs ask this when they start, since a socket
+/// that cannot be bound later explains nothing.
 FERROX_EXPORT std::string InstanceRootProblem();
 
 /// The daemons' sockets (docs/formats/daemon.md). All of these paths go through InstancePath.

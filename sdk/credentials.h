@@ -12,6 +12,10 @@ namespace ferrox::sdk {
 /// the whole process, not of one thread: files that other threads open meanwhile are opened as that user, too. Keep the
 /// scope short, and have one at a time. Each call asks the platform under SDKMutex() (common/sdk_mutex.h), which the
 /// caller must not hold; that may block for as long as the host's user database does.
+///   {
+///     const ferrox::sdk::SDKCredentials as_user("ann");
+///     readable = CheckACLPerm(path, KOVA_PERM_READ);
+///   }  // the process is itself again
 class FERROX_EXPORT SDKCredentials {
  public:
   /// Remembers only. @throws Error kCredentialsFailed when the present user is unknown to the platform.
@@ -29,10 +33,10 @@ class FERROX_EXPORT SDKCredentials {
   void AsUser(const std::string& user);
 
  private:
-  uid_t uid_;
+  uid_t uid_;  ///< the effective ids to go back to
   gid_t gid_;
-  std::string username_;
-  int exceptions_in_flight_;
+  std::string username_;      ///< of uid_: the platform changes the identity by name
+  int exceptions_in_flight_;  ///< at construction; more of them at the end mean that one is leaving the scope
 };
 
 }  // namespace ferrox::sdk

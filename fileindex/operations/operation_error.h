@@ -17,7 +17,13 @@ struct OperationStep {
 
 /// How a management operation (index_mgr.h) fails once it has begun to change something. Code, reason and About() are
 /// those of the call that failed. What stood before the failed step is done and stays; an operation that fails before
-/// its first step throws a plain Error, or a SubjectError, and has changed nothing. Who does not care catches Error.
+/// its first step throws a plain Error, or a SubjectError, and has changed nothing. Callers to whom that makes no
+/// difference catch Error.
+///   try {
+///     FolderDelete(paths);
+///   } catch (const OperationError& error) {
+///     Show("not done: " + error.NotDoneText());
+///   }
 class FERROX_EXPORT OperationError : public SubjectError {
  public:
   /// `not_done` begins with the step that `failure` ended.

@@ -15,9 +15,15 @@ class QueueScan;
 
 /// One share's event queue file and its processing copy. Writers append to the live queue; a reader detaches it by a
 /// rename to its ".tmp" name, works through that, and deletes it. At most one detached queue exists at a time. Missing
-/// queue files count as empty.
+/// queue files count as empty. One object is not for several threads at once: trees are kept in const members.
+/// Work through a queue goes like this. A process that is killed in the middle finds the detached queue at its next
+/// start, and begins that anew:
+///   QueueMgr queue(share.GetQueuePath());
+///   queue.ProcessOP(carry_out, true);
+///   queue.DeleteTmp();
 class FERROX_EXPORT QueueMgr {
  public:
+  /// For the queue at `queue_path`, a full path. Opens nothing yet.
   explicit QueueMgr(const std::string& queue_path);
 
   /// Removes the detached queue; a missing one is no error.
@@ -57,7 +63,7 @@ class FERROX_EXPORT QueueMgr {
 
   std::string queue_path_;
   std::string queue_path_tmp_;
-  mutable std::shared_ptr<OPTree> op_tree_;
+  mutable std::shared_ptr<OPTree> op_tree_;  ///< null until it is asked for, like the next
   mutable std::shared_ptr<OPTree> op_tree_tmp_;
 };
 
