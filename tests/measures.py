@@ -1,7 +1,8 @@
 #!/usr/bin/env python3
 """Prints the measures that this code is kept by, and with --check fails where one of the marks does not hold.
 
-Lines are raw lines (blank and comment lines included) of the files that git knows, but for the comment share.
+Lines are raw lines (blank and comment lines included) of the files that git knows, but for the comment share. Without
+git, or in a tree that it does not know, nothing is measured, and the exit code is 77.
 
 code            the C++ of base, platform, common, sdk, wire, fileindex, services and cli
 tests           the C++ and the Python in tests/. Not counted: data files (those that are neither), CMake and shell files,
@@ -27,6 +28,7 @@ import include_rules  # noqa: E402
 ROOMS = ("base", "platform", "common", "sdk", "wire", "fileindex", "services", "cli")
 PUBLIC = ("common/", "sdk/", "platform/include/")  # installed whole
 FILE_LINES, FUNCTION_LINES, FUNCTION_AIM = 300, 50, 30
+SKIPPED = 77  # the exit code by which ctest knows
 COMMENTS_MIN, PUBLIC_COMMENTS_MIN, TESTS_MAX = 15, 45, 0.36  # percent, percent, tests per line of code
 STANDARD_MUTEX = re.compile(r"\bstd::(recursive_|shared_|timed_)*mutex\b|\bstd::condition_variable")
 # What of a line matters here: a literal (raw, string, character; not the ' in 1'000), a comment, any other text.
@@ -43,6 +45,15 @@ def text_of(name):
 def files(suffixes, *folders):
     listed = subprocess.run(["git", "-C", ROOT, "ls-files", "-z", *folders], capture_output=True, text=True, check=True)
     return sorted(name for name in listed.stdout.split("\0") if name.endswith(suffixes) and (ROOT / name).is_file())
+
+
+def git_problem():
+    """Why git cannot say which files belong here, as in a tree that was exported; "" when it can."""
+    if not shutil.which("git"):
+        return "git is not installed"
+    known = subprocess.run(["git", "-C", ROOT, "ls-files", "--error-unmatch", "tests/measures.py"], capture_output=True,
+                           text=True, check=False)
+    return known.stderr.strip()
 
 
 def lines(names):
@@ -113,6 +124,9 @@ def main():
     parser = argparse.ArgumentParser(description=__doc__, formatter_class=argparse.RawDescriptionHelpFormatter)
     parser.add_argument("--check", action="store_true", help="exit 1 when a mark does not hold")
     check = parser.parse_args().check
+    if problem := git_problem():
+        print(f"skipped: {problem}")
+        return SKIPPED
     code, cpp, python = files((".cpp", ".h"), *ROOMS), files((".cpp", ".h"), "tests"), files(".py", "tests")
     print_sizes(code)
     public, wrong = public_headers(code), []
