@@ -40,12 +40,12 @@ inline bool IsJsonArray(const Json::Value& value) { return value.isArray() || va
 
 /// Whether `value` can be read as a `T`, and the reading. For std::string, bool, int, unsigned int, long long, double.
 /// long long takes integers only, the others whatever the JSON library converts without loss of range:
-///   std::string        a text, a number or bool (as its text), null (as "")
+///   std::string        a string, a number or bool (as its text), null (as "")
 ///   bool               a bool, a number (false for 0), null (as false)
 ///   int, unsigned int  a number in the type's range (without its fraction), a bool (0 or 1), null (as 0)
 ///   double             a number, a bool (0 or 1), null (as 0)
 ///   long long          an integer from -2^63 to 2^63 - 1
-/// A text is never read as a number or a bool, and neither an object nor an array as any of these.
+/// A string is never read as a number or a bool, and neither an object nor an array as any of these.
 template <typename T>
 bool isJsonType(const Json::Value& value);
 /// The value read as a `T`, by the table above. Call only where isJsonType holds: elsewhere the JSON library throws or

@@ -3,6 +3,7 @@
 /// The platform's error details. Each platform call that fails sets them for its own thread; they stay until the next
 /// failure of that thread. Calls that succeed leave them alone: ask only after a call has failed. The codes are what
 /// programs decide by; the place is for the log.
+///   if (KOVAShareGet(name, &share) < 0 && KLIBCErrGet() == KOVA_ERR_NO_SUCH_SHARE) return NotThere(name);
 
 #ifdef __cplusplus
 extern "C" {
