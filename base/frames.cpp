@@ -88,7 +88,7 @@ bool RecvAll(int fd, char* data, size_t size, int idle_timeout_ms) {
   return true;
 }
 
-/// A connect that a signal interrupts goes on by itself; its outcome is told by SO_ERROR.
+/// A connect that a signal interrupts goes on in the kernel; SO_ERROR holds its outcome once the socket is writable.
 bool FinishConnect(int fd) {
   if (!WaitFor(fd, POLLOUT, kConnectSec * 1000)) return false;
   int error = 0;

@@ -26,7 +26,7 @@ inline constexpr char kFileIndexdSocket[] = "/var/run/fileindexd.sock";
 inline constexpr char kElasticdSocket[] = "/var/run/kovaelasticd.sock";
 inline constexpr char kNotifydSocket[] = "/var/run/kovanotifyd.sock";
 inline constexpr char kContentExtractdSocket[] = "/var/run/kovacontentextractd.sock";
-/// The indexed folders and the states of indexing; each is written by whoever holds its lock file below.
+/// The indexed folders and the states of indexing; each is written under its lock file below.
 inline constexpr char kConfigurationFolder[] = "/var/packages/Ferrox/etc";
 inline constexpr char kFileIndexFoldersCfgPath[] = "/var/packages/Ferrox/etc/fileindex.folders";
 inline constexpr char kFileIndexStatusCfgPath[] = "/var/packages/Ferrox/etc/fileindex.status";

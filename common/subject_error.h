@@ -39,7 +39,7 @@ struct Subject {
   std::string name;
 };
 
-/// An Error that says what it is about. Whoever catches an Error catches these, too; it must be passed on with
+/// An Error that says what it is about. A handler for Error catches these, too; it passes them on with
 /// "throw;", since a copy as an Error drops the subject.
 class FERROX_EXPORT SubjectError : public Error {
  public:

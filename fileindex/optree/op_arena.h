@@ -22,8 +22,8 @@ namespace ferrox::fileindex {
 /// take one by one. The tree's thread allocates; any thread may release, since callers keep objects where they like.
 ///
 /// Objects are counted so that the common case, Release, is one atomic operation and Allocate none: while the tree
-/// lives, `balance_` falls below zero by what was released, and Close adds what was allocated. Whoever then brings it
-/// to zero, Close or a Release, deletes the arena.
+/// lives, `balance_` falls below zero by what was released, and Close adds what was allocated. The call that then
+/// brings it to zero, Close or a Release, deletes the arena.
 class OPArena {
  public:
   OPArena() = default;

@@ -35,7 +35,7 @@ struct OPBranch {
   uint32_t first_hash_ = 0;        ///< of the first child's name
 };
 
-/// A hash with a key of this process: whoever may name files must not be able to choose names that collide.
+/// A hash with a key of this process: users name the files, and must not be able to choose names that collide.
 uint32_t HashName(std::string_view name);
 
 }  // namespace ferrox::fileindex

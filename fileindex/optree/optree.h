@@ -41,7 +41,7 @@ enum FileIndexOP : int32_t {
   OP_FULL_REINDEX = 7,  ///< the queue lost events: reindex everything
 };
 
-/// One pending operation. It is shared by the node, the tree's list and whoever keeps it; the tree changes it while
+/// One pending operation. It is shared by the node, the tree's list and callers that keep it; the tree changes it while
 /// events are inserted, and not once they are handed out.
 struct FERROX_EXPORT OP {
   OP(std::shared_ptr<OPNode> node, FileIndexOP op, const std::string& path, const Json::Value& data);

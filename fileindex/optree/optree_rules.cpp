@@ -12,8 +12,8 @@
 // How an event is folded into what is pending already for its path and, of folders, below it.
 //
 // The index daemon looks at the disk when it carries an operation out, which is after all events of the queue. So it
-// does not matter when a file was written, only whether it is looked at once more: the table below keeps, of all that
-// happened to a path, what makes the daemon look at as much as it must.
+// does not matter when a file was written, only whether it has to be read once more: of all that happened to a path,
+// the table below keeps the operation that makes the daemon compare as much as it must, and no more.
 
 namespace ferrox::fileindex {
 

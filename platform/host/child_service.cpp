@@ -271,7 +271,7 @@ int StopChildService(const ServiceRow& service) {
   if (Prepare(service, lock) < 0) return -1;
   const pid_t pid = RunningPid(service);
   const ProcessHandle process(pid);
-  // The process is looked at again behind its handle: from here on nobody else can have its number.
+  // The pid file is read again behind the handle: while that is open, no other process can get the number.
   if (pid == 0 || RunningPid(service) != pid) {
     EmptyPidFile(service);
     return 0;

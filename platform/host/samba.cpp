@@ -71,8 +71,8 @@ int Read(Reading& reading) {
   return 0;
 }
 
-/// Says of which shares the switch is in a file that is not ours to change.
-void TellIncluded(const Reading& reading) {
+/// Logs each share whose section is in an included file: that is not ours to change, so people set the switch there.
+void LogIncludedSwitches(const Reading& reading) {
   if (reading.elsewhere.empty()) return;
   for (const kova::host::IncludedFile& file : kova::host::ReadIncludedFiles(*reading.conf)) {
     for (const std::string& share : reading.elsewhere) {
@@ -114,7 +114,7 @@ int KOVASMBIsEnableSpotlight(void) {
 int KOVASMBSetSpotlight(int enable) {
   Reading reading;
   if (Read(reading) < 0) return -1;
-  TellIncluded(reading);
+  LogIncludedSwitches(reading);
   if (reading.sections.empty()) {
     return Refuse(KOVA_ERR_NOT_SUPPORTED, reading.path,
                   "no share stands in " + reading.path + ": Spotlight is not switched");

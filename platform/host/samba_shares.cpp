@@ -71,7 +71,7 @@ bool TakeSection(const SmbConf& conf, const std::string& section, ShareEntry& sh
   if (problem.empty()) problem = FolderProblem(share);
   if (!problem.empty()) return false;
   share.hide_unreadable = conf.IsOn(section, "hide unreadable");
-  // Samba lets nobody write unless it is told to. What keeps the host itself from writing is the volume.
+  // Samba lets nobody write unless "read only" is off. Whether the host itself can write depends on the volume.
   share.ftp_privilege = SmbConf::Boolean(value("read only")) == false ? 2 : 1;
   if (!HasRecycle(value("vfs objects"))) return true;
   share.recycle = RecycleFolder(value("recycle:repository"));
@@ -93,7 +93,8 @@ SeenFile Look(const std::string& path) {
   return file;
 }
 
-/// The last answer and what it was made from. One mutex around all: testparm runs once, whoever asks.
+/// The last answer and what it was made from. One mutex around all, so that callers that ask at once share one run of
+/// testparm.
 class Source {
  public:
   std::shared_ptr<const std::vector<ShareEntry>> Get() {
@@ -124,7 +125,7 @@ class Source {
                        [](const SeenFile& file) { return !SameFile(Look(file.path).info, file.info); });
   }
 
-  /// The files are looked at first: what changes while testparm runs is seen the next time.
+  /// Takes the files' stamps before testparm runs: what changes meanwhile is noticed by the next call.
   void Ask(const Configuration::Samba& samba) BASE_REQUIRES(mutex_) {
     files_ = {Look(samba.config)};
     std::string text, output;

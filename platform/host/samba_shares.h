@@ -17,7 +17,8 @@ std::shared_ptr<const std::vector<ShareEntry>> SambaShares();
 /// Makes the next SambaShares check these files even within the same second: for a caller that has just changed one.
 void ExpectSambaChange();
 
-/// The shares in what testparm writes. What cannot be a share here is told in `problems`, a sentence each.
+/// The shares in what testparm writes. `problems` gets a sentence for each section that cannot be a share
+/// here.
 std::vector<ShareEntry> ParseTestparm(const std::string& output, std::vector<std::string>& problems);
 
 }  // namespace kova::host

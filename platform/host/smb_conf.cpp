@@ -23,7 +23,7 @@ bool IsLineEnd(const std::string& text, size_t at) {
 }
 
 /// Without the "\" of continued lines, each run of blanks as one, none at the ends.
-std::string Squeeze(const std::string& text) {
+std::string CollapseBlanks(const std::string& text) {
   std::string out;
   for (size_t i = 0; i < text.size(); ++i) {
     const bool blank = IsBlank(text[i]) || (text[i] == '\\' && IsLineEnd(text, i + 1));
@@ -39,7 +39,7 @@ std::string Squeeze(const std::string& text) {
 
 std::string FoldParameter(const std::string& name) {
   std::string out;
-  for (const char c : Squeeze(name)) {
+  for (const char c : CollapseBlanks(name)) {
     if (c != ' ') out += Lower(c);
   }
   return out;
@@ -54,7 +54,7 @@ std::string ValueKey(const std::string& folded_section, const std::string& folde
 SmbConf::SmbConf(std::string text) : text_(std::move(text)) { Parse(); }
 
 std::string SmbConf::Fold(const std::string& section) {
-  std::string out = Squeeze(section);
+  std::string out = CollapseBlanks(section);
   std::transform(out.begin(), out.end(), out.begin(), &Lower);
   return out;
 }
@@ -106,7 +106,7 @@ size_t SmbConf::TakeHeader(size_t begin) {
   const size_t end = LogicalEnd(begin), close = FindBefore(end, ']', begin);
   section_ = kNoSection;
   if (close == end) return end;
-  const std::string name = Squeeze(text_.substr(begin + 1, close - begin - 1));
+  const std::string name = CollapseBlanks(text_.substr(begin + 1, close - begin - 1));
   const size_t next = std::min(text_.find('\n', close), text_.size());
   section_ = Fold(name);
   if (headers_.emplace(section_, lines_.size()).second) sections_.push_back(name);
@@ -122,7 +122,7 @@ size_t SmbConf::TakeParameter(size_t begin) {
   while (value_end > value_begin && IsBlank(text_[value_end - 1])) --value_end;
   while (value_begin < value_end && IsBlank(text_[value_begin])) ++value_begin;
   const std::string name = FoldParameter(text_.substr(begin, equals - begin));
-  const std::string value = Squeeze(text_.substr(value_begin, end - value_begin));
+  const std::string value = CollapseBlanks(text_.substr(value_begin, end - value_begin));
   values_[ValueKey(section_, name)].push_back(lines_.size());
   lines_.push_back({section_, name, value, indent_begin, begin, value_begin, value_end, end});
   return end;

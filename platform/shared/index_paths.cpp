@@ -47,7 +47,7 @@ std::string Compose(const std::string& share_path, const char* folder_name, cons
   const std::string folder = state + "/" + folder_name;
   struct stat info = {};
   const bool is_there = stat(folder.c_str(), &info) == 0;
-  // Whoever can open what lies here can hold its lock.
+  // A user who can open a lock file in the folder could hold its lock, and keep the daemons out.
   if (is_there && (info.st_mode & 077) != 0 && info.st_uid == geteuid()) (void)chmod(folder.c_str(), 0700);
   const bool made =
       is_there || (base::MakeFolders(state.substr(0, state.rfind('/'))) && base::MakeFolders(folder, 0700));

@@ -128,7 +128,7 @@ bool GiveToOwnerOf(const struct stat& folder, int fd) {
   return geteuid() != 0 || folder.st_uid == 0 || fchown(fd, folder.st_uid, folder.st_gid) == 0;
 }
 
-/// For the folder's owner, whoever makes it.
+/// The new file belongs to the folder's owner, also when root makes it.
 Outcome MakeNew(const std::string& path, const struct stat& folder) {
   const Descriptor file(open(path.c_str(), O_RDWR | O_CREAT | O_EXCL | O_CLOEXEC, 0600));
   if (file.Get() < 0) return errno == EEXIST ? Outcome::kAgain : Outcome::kFailed;

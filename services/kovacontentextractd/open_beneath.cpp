@@ -25,7 +25,7 @@ int AskKernel(int root, const char* below, int flags) {
   return static_cast<int>(syscall(SYS_openat2, root, below, &how, sizeof(how)));
 }
 
-/// A link in the place of a folder is ENOTDIR to the kernel here; it is told as what it is.
+/// Opens a folder without following a link. The kernel reports a link in its place as ENOTDIR; here it is ELOOP.
 base::UniqueFd StepInto(int folder, const char* name) {
   base::UniqueFd next(openat(folder, name, kFolderFlags));
   struct stat info = {};

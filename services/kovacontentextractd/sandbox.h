@@ -15,7 +15,7 @@ inline constexpr bool kSanitized = false;
 #endif
 
 /// Takes from this process, for good, what root may and others may not: a template needs nothing of it once it is
-/// loaded, and its workers never have it. Whoever may change users becomes one that nobody else is.
+/// loaded, and its workers never have it. A process that may change its user takes one that no other process has.
 /// @param empty_folder becomes the root of the file system where that is allowed
 /// @return what is missing, one name each; empty when all is given up
 std::vector<std::string> GiveUpRights(const char* empty_folder);

@@ -128,8 +128,8 @@ void Read(const Worker& worker, const Request& request, Findings& findings) try 
   findings.Fail("damaged");
 }
 
-/// Whoever stops the daemon may signal all its processes. A worker goes on until the daemon ends it, or no longer
-/// lives: else the file that it reads would be blamed.
+/// Ignores the signals that end a service: a service manager may send them to all processes of the daemon. A worker
+/// goes on until the daemon ends it or has died itself: else the file that it reads would be blamed.
 void LeaveEndToDaemon() {
   for (const int number : {SIGTERM, SIGINT, SIGHUP, SIGQUIT}) (void)signal(number, SIG_IGN);
 }

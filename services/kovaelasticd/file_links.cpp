@@ -44,8 +44,8 @@ void FileLinks::OnChange(int64_t id, const DocRow* before, const DocRow* after) 
     }
     if (file != 0) database_.Prepare("INSERT INTO files VALUES(?1, ?2)").Bind(1, file).Bind(2, id).Run();
   }
-  // Also when it was a suspect, or has the stamp of before: another name may have been looked at before the file last
-  // changed, and written since.
+  // Also when it was a suspect, or has the stamp of before: the document of another name may have been made
+  // before the file last changed, and been stored since.
   if (file != 0) MarkOthers(file, id, stamp);
 }
 

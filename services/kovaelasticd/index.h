@@ -18,8 +18,8 @@ namespace ferrox::engine {
 ///
 /// Changes of several callers share a transaction; a commit that several wait for is made once. What nobody commits is
 /// committed after a while, or after kAutoCommitBytes. When changes that were answered with success are lost (a full
-/// disk, or a process that died: a marker file beside the index tells), the next commit fails, so that whoever relies
-/// on it sends them again.
+/// disk, or a process that died: a marker file beside the index tells), the next commit fails, so that the sender
+/// of the changes sends them again.
 class Index {
  public:
   static constexpr std::chrono::milliseconds kAutoCommitAfter{5000};

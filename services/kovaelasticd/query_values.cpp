@@ -183,7 +183,7 @@ std::optional<ValueRange> ParseNumber(std::string_view text) {
   return number.has_value() && text.empty() ? std::optional(ValueRange{*number, *number}) : std::nullopt;
 }
 
-/// "90", "5m", "1h30m", "3:25", "1:02:03": seconds, up to the end of the last unit that is told.
+/// "90", "5m", "1h30m", "3:25", "1:02:03": a range of seconds as long as the last unit: "5m" is 300 to 359.
 std::optional<ValueRange> ParseDuration(std::string_view text) {
   const bool clock = text.find(':') != std::string_view::npos;
   if (text.empty() || text.back() == ':') return std::nullopt;

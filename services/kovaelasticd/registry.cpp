@@ -139,7 +139,7 @@ void Registry::HealDamaged() {
     try {
       if (*record.slot->damaged) (void)Open(id);
     } catch (const Error&) {
-      // Logged where it arose; whoever asks for the index next is told.
+      // Logged where it arose; the next request for the index fails with it.
     }
   }
 }

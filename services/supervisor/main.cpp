@@ -57,7 +57,7 @@ class SupervisedService {
   std::chrono::seconds pause_ = kPauseMin;
 };
 
-/// Returns when it is told to stop, or when its pid file is gone: the folder of the instance was removed, and with it
+/// Returns at a signal to stop, or when its pid file is gone: the folder of the instance was removed, and with it
 /// what there was to supervise.
 void Supervise() {
   ferrox::services::Daemon daemon(kova::host::kSupervisor.program);

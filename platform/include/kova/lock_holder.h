@@ -5,13 +5,14 @@
 #include <string>
 #include <vector>
 
-/// A lock of flock needs no more than a file that can be read, and its holder keeps out whoever comes later.
+/// Who holds a lock file. A lock of flock needs no more than a file that can be read, so a process that only may read
+/// it can keep all others out; the functions here find that process, and make lock files that others cannot open.
 namespace kova {
 
 struct LockHolder {
   pid_t pid = 0;
   uid_t user = 0;       ///< who started it
-  std::string command;  ///< empty when the process cannot be looked at
+  std::string command;  ///< empty when the process's entry in /proc cannot be read
 };
 
 /// The processes that hold a lock on the file at `path`. Root and the holder's own user find them by their open files,

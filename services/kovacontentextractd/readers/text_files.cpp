@@ -16,7 +16,7 @@ namespace {
 /// How much of a file is read. UTF-16 holds less text than it has bytes, and a saved page may hold its pictures.
 constexpr size_t kReadMaxBytes = 2U << 20;
 constexpr size_t kMarkupMaxBytes = 16U << 20;
-/// How much of a file that is no text is looked at to tell what it is.
+/// How much of a file that is no text is read to find out its type.
 constexpr size_t kMagicBytes = 64U << 10;
 
 /// The library's table, loaded once before the sandbox closes; null when it could not be. Of the worker's one thread.

@@ -35,8 +35,8 @@ struct WatchState {
 };
 
 /// Decides which folders are roots and in which way each is watched: the first way that does not refuse it, or, when
-/// all/// refuse, by a comparison of the whole root at intervals. A root whose folder is missing or unusable waits
-/// until there is one. A folder that is there again, or is another one than before, is compared once it is covered; so
+/// all refuse, by a comparison of the whole root at intervals. A root whose folder is missing or unusable waits until
+/// there is one. A folder that is there again, or is another one than before, is compared once it is covered; so
 /// is one that was removed, but not one that went away with its volume. Belongs to one thread.
 ///
 /// A root goes from kWaiting to kSettingUp when its folder is usable and a watcher gets it, to kCovered when that

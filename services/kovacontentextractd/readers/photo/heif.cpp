@@ -102,7 +102,7 @@ std::string ItemBytes(std::string_view file, std::string_view meta, uint64_t wan
     (void)places.Number(2);
     const uint64_t base = places.Number(base_size);
     const uint64_t count = places.Number(2);
-    // Where a piece is told by nothing, it takes no bytes here, however many there are.
+    // With all three sizes 0 the pieces take no bytes in the box, whatever `count` is.
     Bytes pieces(places.Take(count * (index_size + offset_size + length_size)));
     if (number != wanted) continue;
     const std::string_view from = in_data_box ? ContentOf(meta, "idat"sv) : file;
