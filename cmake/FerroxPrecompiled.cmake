@@ -1,13 +1,14 @@
-# The headers of others that nearly every source includes, compiled once: reading them is half of the time that our short
-# sources take. Only a means: every source includes what it needs, and the builds without this hold that.
+# The headers of others that nearly every source includes, compiled once: reading them is half of the time that our
+# short sources take. No source may rely on it: each includes what it needs, and the builds without this check that.
 option(FERROX_PRECOMPILE "Compile the headers of the standard library and JsonCpp once" OFF)
 
 set(ferrox_common_headers <algorithm> <array> <atomic> <cerrno> <chrono> <condition_variable> <cstdint> <cstdio> <cstring>
     <functional> <map> <memory> <mutex> <optional> <set> <string> <string_view> <thread> <unordered_map> <utility> <vector>
     <json/value.h>)
 
-# ferrox_precompile(OWNER TYPES SOURCES FOLDER): all targets of FOLDER and below whose type matches TYPES and one of whose
-# sources matches SOURCES use the headers that the target OWNER has compiled. The code of programs and of libraries is made for different places, so they cannot share.
+# ferrox_precompile(OWNER TYPES SOURCES FOLDER): all targets of FOLDER and below whose type matches TYPES and one of
+# whose sources matches SOURCES use the headers that the target OWNER has compiled. Libraries and programs are compiled
+# with different flags (position-independent code), so that they cannot share an owner.
 function(ferrox_precompile owner types of_sources folder)
   get_property(targets DIRECTORY ${folder} PROPERTY BUILDSYSTEM_TARGETS)
   list(REMOVE_ITEM targets ${owner})

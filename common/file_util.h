@@ -19,7 +19,7 @@ FERROX_EXPORT bool IsFileExist(const std::string& path);
 /// Deliberate: a link's relative target is taken from the working directory, not from the link's folder.
 FERROX_EXPORT bool IsDirExist(const std::string& path, bool follow);
 
-/// Whether the directory entry, found at `path`, is a directory as far as its type tells.
+/// Whether the directory entry, found at `path`, is a directory, by its type alone.
 /// Deliberate: an entry of unknown type counts as none, whatever lstat would say.
 FERROX_EXPORT bool IsDirentDir(const dirent& entry, const std::string& path);
 

@@ -37,7 +37,7 @@ bool IsRegular(int fd) {
 
 void WaitForNextAttempt() { Clock::Get().SleepFor(std::chrono::milliseconds(100 * (rand() % 10))); }
 
-/// Who keeps a lock for longer than anybody waits is worth knowing.
+/// Names in the log the process that kept the lock for longer than all attempts took.
 void LogHolder(const std::string& path) {
   const int saved_errno = errno;
   const std::string holder = kova::LockHolderText(path);

@@ -39,8 +39,8 @@ T Member(const Json::Value& object, const char* key, T absent = {}) {
   return absent;
 }
 
-/// Returns when there is a file at the socket's path, or after the last check. Whether anybody serves it, connecting
-/// tells.
+/// Returns when there is a file at the socket's path, or after the last check. Only connecting shows whether a process
+/// serves it.
 void WaitForSocket(const std::string& path) {
   for (int check = 1; check <= kSocketChecks; ++check) {
     if (access(path.c_str(), F_OK) == 0 || check == kSocketChecks) return;

@@ -37,7 +37,7 @@ class FERROX_EXPORT Folder {
   bool IsVideo() const { return video_; }
   bool IsPhoto() const { return photo_; }
 
-  /// Kept for other programs; nothing here goes by it.
+  /// Kept for other programs; the library stores it and does not use it.
   bool IsPrivileged() const { return privileged_; }
   /// Whether indexing stands still for the folder, since its share or its volume was paused (SharePause, VolumePause).
   bool IsPaused() const { return paused_; }

@@ -9,7 +9,7 @@
 namespace ferrox::fileindex {
 
 /// A step of a management operation that was not carried out. Its text is for people and for the log, where the names
-/// of shares stand as they are; a program goes by `about`.
+/// of shares stand as they are; programs use `about`.
 struct OperationStep {
   std::string what;  ///< in the infinitive: "save the folders", "stop the worker of photo"
   Subject about;     ///< the share, user or list that it would have changed

@@ -130,7 +130,7 @@ class SwitchLock {
     return file_.Valid();
   }
 
-  /// Why it could not be had.
+  /// Why the lock could not be taken.
   std::string Problem() const {
     if (!file_.Valid()) return InstanceRoot() + "/var/run cannot be written";
     const std::string holder = LockHolderText(path_);

@@ -14,7 +14,7 @@ struct Configuration {
   struct Samba {
     std::string config;                          ///< its configuration's text
     bool shares = false;                         ///< whether its shares are shares here
-    std::string testparm = "/usr/bin/testparm";  ///< what tells them
+    std::string testparm = "/usr/bin/testparm";  ///< the program that lists them
     /// What reaches its running processes; empty in an instance that is not the host's own, unless it is set.
     std::string smbcontrol;
   } samba = {};
@@ -23,11 +23,11 @@ struct Configuration {
     std::vector<std::string> watch = {"fanotify", "fanotify inode marks", "inotify", "periodic scan"};
     uint32_t scan_interval_sec = 600;  ///< between the scans of what it cannot watch
   } notifyd = {};
-  std::string problem = {};
+  std::string problem = {};  ///< why the file cannot be used, for people; empty when it can
 };
 
 /// The present configuration, re-read when its file has changed; a missing file is a configuration of defaults.
-/// `problem` tells why the file cannot be used, which is logged.
+/// A `problem` is logged when it is found.
 std::shared_ptr<const Configuration> GetConfiguration();
 
 }  // namespace kova::host

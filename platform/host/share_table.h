@@ -25,7 +25,7 @@ struct ShareEntry {
   bool read_only = false;
   bool hide_unreadable = false;
   uint32_t ftp_privilege = 2;
-  bool from_samba = false;  ///< not of the table: Samba's configuration tells of it
+  bool from_samba = false;  ///< read from Samba's configuration, not from the table
 };
 
 /// What is wrong, as one sentence that says what to do.

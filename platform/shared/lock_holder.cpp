@@ -100,6 +100,7 @@ bool IsHeldByOthers(const std::string& path, const struct stat& folder) {
                      [&](const LockHolder& holder) { return !holder.command.empty() && !IsOurs(holder.user, folder); });
 }
 
+/// Unlike base::UniqueFd it keeps errno when it closes: what follows fails with the errno of the call that failed.
 class Descriptor {
  public:
   explicit Descriptor(int fd) : fd_(fd) {}

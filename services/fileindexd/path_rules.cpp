@@ -30,7 +30,7 @@ bool AskAllRules(const std::string& folder) {
     if (gone) return !fileindex::IsFullPathInRecycleBin(folder);
     return fileindex::CanFullPathBeIndexed(folder) && !InSnapshot(folder);
   } catch (const Error&) {
-    return false;  // its share cannot be told any more
+    return false;  // the path lies in no share any more
   }
 }
 

@@ -15,7 +15,7 @@ class CompoundReply;
 
 /// Answers the engine's requests (docs/formats/engine.md): one command, or a compound of many, which are carried out in
 /// their order and answered one by one. Any number of threads may call Handle; a change waits for the thread of its
-/// index, a search for nobody.
+/// index, a search for no other request.
 class Engine {
  public:
   /// Loads the indices that are noted in `state_folder`. @throws Error kInternal.

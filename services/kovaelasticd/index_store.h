@@ -21,7 +21,7 @@ struct GetRequest {
   std::string after;                ///< only paths behind this one
   int64_t limit = -1;               ///< at most so many; below 0: all
   std::vector<std::string> fields;  ///< the fields to load; empty: all
-  /// Documents that may not know of a change of their file, which was told of under another of its names.
+  /// Documents that may be older than their file, since a change was reported under another of its names only.
   bool suspects = false;
   bool unread = false;  ///< documents with "_KOVAExtractError"
   uint64_t file = 0;    ///< the number at the end of "_KOVAStamp"; 0: not asked for

@@ -25,7 +25,7 @@ class RebuildState {
 
   /// Whether one more may begin at this time, in seconds since the epoch.
   bool MayBegin(int64_t now) const;
-  /// Begins one. `asked`: somebody did, and what was before no longer counts.
+  /// Begins one. `asked`: a client asked for it; those that began before no longer count.
   void Begin(int64_t now, const std::string& reason, bool asked);
   void SetMade(bool made) { made_ = made; }
   void End() { since_ = 0; }
@@ -39,7 +39,7 @@ class RebuildState {
   int64_t since_ = 0;
   std::string reason_;
   bool made_ = true;
-  std::vector<int64_t> times_;  ///< when those began that nobody asked for
+  std::vector<int64_t> times_;  ///< when those began that no client asked for
 };
 
 }  // namespace ferrox::engine

@@ -4,7 +4,7 @@
 
 #include "common/error.h"
 
-/// The library tells of settings that it cannot use in its own words, which name neither the file nor the remedy.
+/// Problems of the settings, in words for people: the library's errors name neither the file nor the remedy.
 namespace ferrox::services {
 
 /// What is wrong with the list of indexed folders, which people may have changed by hand: a sentence that names the

@@ -22,7 +22,7 @@ std::vector<LockHolder> LockHolders(const std::string& path);
 /// "process 12 (sleep) of user 1000 holds the lock"; empty when nobody is found.
 std::string LockHolderText(const std::string& path);
 
-/// Whether `path` still names the open file: a file may be replaced or renamed away before the lock on it is had.
+/// Whether `path` still names the open file: a file may be replaced or renamed away before the lock on it is taken.
 bool IsStillAt(int fd, const std::string& path);
 
 /// Whether a process has been killed, or has ended, although it may still hold locks: a large one for seconds.

@@ -5,7 +5,7 @@
 
 namespace ferrox::extract {
 
-/// Bytes whose encoding nothing tells, as UTF-8: unchanged where they are that, else read as Latin-1.
+/// Bytes of unknown encoding, as UTF-8: unchanged where they are that, else read as Latin-1.
 std::string Utf8OrLatin1(std::string_view bytes);
 
 /// Undoes that somebody took UTF-8 for Latin-1: many programs write UTF-8 into fields that have no encoding.
@@ -15,7 +15,7 @@ std::string WithoutDoubleEncoding(std::string text);
 /// ones that programs wrote into fields without encoding. Empty when they may be Latin-1. All texts of one file
 /// together tell more than each alone.
 std::string TrueEncoding(std::string_view texts);
-/// The text that was taken for Latin-1, in the encoding that TrueEncoding told; what is not Latin-1 stays.
+/// The text that was taken for Latin-1, in the encoding that TrueEncoding returned; what is not Latin-1 stays.
 std::string InTrueEncoding(std::string text, const std::string& encoding);
 
 }  // namespace ferrox::extract

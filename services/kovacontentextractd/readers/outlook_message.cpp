@@ -18,7 +18,7 @@ namespace {
 // and 0E03 those that it was sent and copied to, 1000 the text, 1013 the same as HTML.
 constexpr size_t kValueMaxBytes = 2U << 20;
 
-/// A property's text by its number: in UTF-16, or in bytes of an encoding that is not told.
+/// A property's text by its number: in UTF-16, or in bytes of an encoding that the file does not name.
 std::string TextOf(const CompoundFile& file, const std::string& number, uint32_t storage = CompoundFile::kRoot) {
   if (const auto wide = file.Open("__substg1.0_" + number + "001F", storage)) {
     return FromUtf16Little(wide->ReadAt(0, kValueMaxBytes));
