@@ -129,12 +129,13 @@ bool ChownFerrox(const std::string& path) {
 }
 
 bool WriteWholeFile(const std::string& path, std::string_view content) {
-  struct stat old = {};
-  const bool exists = stat(path.c_str(), &old) == 0;
-  const base::FileAttributes attributes = {exists ? old.st_mode & 0777 : 0644, exists ? old.st_uid : geteuid(),
-                                           exists ? old.st_gid : getegid(), false};
+  struct stat like = {};
+  const bool exists = stat(path.c_str(), &like) == 0;
   const std::string beside = path + ".new";
   base::UniqueFd file(open(beside.c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC | O_NOFOLLOW, 0600));
+  // A file that is new keeps the group that it was made with, which in a set-group-ID folder is the folder's.
+  if (!exists && file.Valid()) (void)fstat(file.Get(), &like);
+  const base::FileAttributes attributes = {exists ? like.st_mode & 0777 : 0644, like.st_uid, like.st_gid, false};
   return base::ReplaceFile(path, content, attributes, std::move(file), beside);
 }
 
