@@ -2,6 +2,8 @@
 
 #include <iterator>
 
+#include "base/text.h"
+
 namespace ferrox::engine {
 
 namespace {
@@ -12,7 +14,6 @@ struct FoldBlock {
   uint32_t last;
   const uint16_t* folded;
 };
-#include "base/text.h"
 #include "services/kovaelasticd/fold_tables.inc"  // kBlocks, kExpansionBase, kExpansions
 
 /// Code points that all mean the same for the splitting into words.

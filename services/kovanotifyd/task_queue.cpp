@@ -1,3 +1,5 @@
+#define FERROX_SOURCE "notifier"
+
 #include "services/kovanotifyd/task_queue.h"
 
 #include <sys/eventfd.h>
