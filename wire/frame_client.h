@@ -17,7 +17,7 @@
 namespace ferrox::wire {
 
 enum class Outcome {
-  kAnswered,      ///< the reply is there; of AskJson, with "success": true
+  kAnswered,      ///< the reply is there; of AskEngine and AskDaemon, with "success": true
   kRefused,       ///< the daemon's reply is an error
   kNotRunning,    ///< there is no socket, or nobody serves it
   kNotPermitted,  ///< this user may not connect to the socket

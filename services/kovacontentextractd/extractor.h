@@ -21,7 +21,7 @@ class TextTarget {
   explicit TextTarget(int memory) : memory_(memory) {}
   /// @throws Error kInternal when the memory is too small.
   void Take(size_t offset, std::string_view piece);
-  /// The text has so many bytes; what was taken beyond does not count.
+  /// The text has `bytes` bytes in all; what was taken beyond does not count.
   void End(size_t bytes);
   /// Adds the text to a reply with this "data": its bytes behind the reply's text, or in "data" how many there are.
   void AddTo(Json::Value& data) const;

@@ -24,7 +24,7 @@ bool CopyText(int region, size_t bytes, const TextSink& sink);
 /// with errno, when there is none.
 base::UniqueFd CopyAttachment(int region, size_t offset, size_t bytes);
 
-/// Gives back what the attachments in a region, of so many bytes together, took of the system's memory.
+/// Gives back the memory that the attachments in a region, `bytes` together, took.
 void FreeAttachments(int region, size_t bytes);
 
 }  // namespace ferrox::extract

@@ -31,7 +31,7 @@ namespace ferrox::extract {
 
 namespace {
 
-/// Reads exactly so many bytes from the daemon; false when it has hung up.
+/// Reads exactly `size` bytes from the daemon; false when it has hung up.
 bool ReadAll(void* to, size_t size) {
   auto* bytes = static_cast<char*>(to);
   while (size > 0) {

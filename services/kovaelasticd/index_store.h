@@ -56,7 +56,7 @@ struct SearchHit {
 struct SearchReply {
   int64_t total = 0;                     ///< all documents found, whether shown or not
   bool ranking_bounded = false;          ///< there were more than ranked_max to order; some were left out of that
-  std::vector<SearchHit> hits;           ///< from the first, so many as offset and limit ask for together
+  std::vector<SearchHit> hits;           ///< from the first, offset + limit of them at most
   std::vector<std::string> suggestions;  ///< other spellings, when nothing was found
 };
 

@@ -240,8 +240,8 @@ TEST_F(FilesystemWatcherTest, QuietFoldersDoNotWakeIt) {
   EXPECT_EQ(umount(own.c_str()), 0) << strerror(errno);
 }
 
-/// What a listener that believes every word holds of the root.
-class BelievedTree {
+/// The root's tree as a listener builds it from the reports alone.
+class ReportedTree {
  public:
   std::string Apply(const Change& change, bool is_strict) {
     const bool is_known = names_.count(change.path) != 0;
@@ -331,7 +331,7 @@ TEST_F(FilesystemWatcherTest, ReplayOfWhatIsReportedGivesTheTree) {
     notes_.changes.clear();
     MakeChanges(seed, is_strict);
     (void)Reported();
-    BelievedTree tree;
+    ReportedTree tree;
     for (const Change& change : notes_.changes) ASSERT_EQ(tree.Apply(change, is_strict), "");
     tree.LookAtWhatIsInDoubt();
     std::map<std::string, bool> real;

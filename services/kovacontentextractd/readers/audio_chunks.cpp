@@ -36,7 +36,7 @@ void AddSound(const Sound& sound, Findings& findings) {
   if (sound.bits > 0) findings.SetInteger("KOVAMDAudioBitRate", static_cast<int64_t>(bits_a_second));
 }
 
-/// How long so many bytes of samples sound.
+/// How long that many bytes of samples play.
 double SecondsOf(uint64_t bytes, const Sound& sound) {
   const double bits_a_second = sound.rate * static_cast<double>(sound.channels * sound.bits);
   return bits_a_second > 0 ? static_cast<double>(bytes) * 8 / bits_a_second : 0;

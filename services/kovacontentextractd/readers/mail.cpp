@@ -243,7 +243,7 @@ class MailReader {
     findings_.Attach({std::string(name), Unpacked(part, room + 1)});
   }
 
-  /// The part's content without its transfer encoding, at most so many bytes.
+  /// The part's content without its transfer encoding, at most `limit_bytes`.
   static std::string Unpacked(GMimePart* part, size_t limit_bytes) {
     GMimeDataWrapper* content = g_mime_part_get_content(part);
     GMimeStream* packed = content != nullptr ? g_mime_data_wrapper_get_stream(content) : nullptr;
