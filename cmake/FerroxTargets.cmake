@@ -26,6 +26,7 @@ if(FERROX_WERROR)
   target_compile_options(ferrox_options INTERFACE -Werror)
 endif()
 if(FERROX_SANITIZE)
+  target_compile_definitions(ferrox_options INTERFACE FERROX_SANITIZED)  # for tests of what sanitizers change
   target_compile_options(ferrox_options INTERFACE -fsanitize=${FERROX_SANITIZE} -fno-omit-frame-pointer
                                                   -fno-sanitize-recover=all)
   target_link_options(ferrox_options INTERFACE -fsanitize=${FERROX_SANITIZE})

@@ -39,7 +39,7 @@ TEST(JsonUtilTest, ErrorTextOfADeepDocumentIsBounded) {
   EXPECT_LT(AppendData(deep).size(), 70000U);
 }
 
-#if !defined(__SANITIZE_ADDRESS__) && !defined(__SANITIZE_THREAD__)
+#if !defined(FERROX_SANITIZED)
 TEST(JsonUtilDeathTest, TextThatMemoryIsTooShortForIsNoText) {
   const auto write_with_little_memory = [] {
     Json::Value value(Json::arrayValue);

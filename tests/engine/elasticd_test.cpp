@@ -134,7 +134,7 @@ TEST_F(ElasticdTest, AskedToStopItCommitsAndLeavesNothingBehind) {
   EXPECT_TRUE(Succeeds(kCommit));
 }
 
-#if !defined(__SANITIZE_ADDRESS__) && !defined(__SANITIZE_THREAD__)
+#if !defined(FERROX_SANITIZED)
 TEST_F(ElasticdTest, LargeRequestsNeitherTakeNorKeepManyTimesTheirSize) {
   Start();
   CreateIndex();
