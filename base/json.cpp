@@ -1,6 +1,5 @@
 #include "base/json.h"
 
-#include <exception>
 #include <memory>
 
 #include <json/reader.h>
@@ -32,7 +31,7 @@ bool ParseJson(std::string_view text, JsonRules rules, Json::Value& value, std::
   const auto& reader = rules == JsonRules::kAnyValue ? of_any : of_documents;
   try {
     if (reader->parse(text.data(), text.data() + text.size(), &value, problem)) return true;
-  } catch (const std::exception& error) {  // nesting beyond the limit
+  } catch (const Json::Exception& error) {  // nesting beyond the limit
     if (problem != nullptr) *problem = error.what();
   }
   value = Json::Value();

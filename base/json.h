@@ -16,10 +16,12 @@ enum class JsonRules {
 };
 
 /// Parses a whole text. False, with `value` null and, unless it is null, `problem` with the parser's words, for
-/// anything else. Throws nothing. Each thread keeps its parsers, so that small texts cost little.
+/// anything else. Throws std::bad_alloc alone: a file for which memory is short must not look damaged. Each thread
+/// keeps its parsers, so that small texts cost little.
 bool ParseJson(std::string_view text, JsonRules rules, Json::Value& value, std::string* problem = nullptr);
 
-/// Reads and parses a regular file; false, with `value` null, when it cannot be read or parsed.
+/// Reads and parses a regular file; false, with `value` null, when it cannot be read or parsed. Throws as
+/// ParseJson does.
 bool ReadJsonFile(const std::string& path, JsonRules rules, Json::Value& value);
 
 }  // namespace base

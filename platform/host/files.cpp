@@ -11,6 +11,7 @@
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
+#include <exception>
 #include <sstream>
 #include <utility>
 
@@ -39,7 +40,12 @@ std::string OneLine(const std::string& text) {
 
 std::string Parse(const std::string& text, Json::Value& value) {
   std::string problem;
-  if (base::ParseJson(text, base::JsonRules::kDocument, value, &problem)) return {};
+  try {
+    if (base::ParseJson(text, base::JsonRules::kDocument, value, &problem)) return {};
+  } catch (const std::exception& error) {  // callers of the platform's C functions expect no exception
+    value = Json::Value();
+    problem = error.what();
+  }
   return "is not JSON: " + OneLine(problem);
 }
 
