@@ -3,8 +3,8 @@
 
 namespace ferrox::fileindex {
 
-// Deliberate: texts of their own, not made from the table of file_types.cpp. That of documents has far fewer extensions,
-// and "cs" twice; callers have the texts as they stand.
+// Deliberate: texts of their own, not made from the table of file_types.cpp. That of documents has far fewer
+// extensions, and "cs" twice; callers have the texts as they stand.
 const std::map<std::string, std::string>& GetCategoryQueries() {
   static const std::map<std::string, std::string> queries = {
       {"document",

@@ -19,8 +19,9 @@
 #include "fileindex/util.h"
 #include "sdk/share.h"
 
-// How the index follows what the platform does with shares and volumes. None of these takes the folder lock: of two that
-// save at the same moment, one wins whole. The order of the steps decides what an operation leaves that stops half way.
+// How the index follows what the platform does with shares and volumes. None of these takes the folder lock: of two
+// that save at the same moment, one wins whole. The order of the steps decides what an operation leaves that stops half
+// way.
 namespace ferrox::fileindex {
 
 namespace {

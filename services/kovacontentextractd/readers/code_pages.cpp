@@ -17,8 +17,8 @@ constexpr std::array<uint16_t, 32> kWindows1252 = {0x20AC, 0x81,   0x201A, 0x019
                                                    0x02DC, 0x2122, 0x0161, 0x203A, 0x0153, 0x9D,   0x017E, 0x0178};
 
 /// The code pages of Windows (below 10000), of the Macintosh (10000 and on) and of old versions of Excel (32768), and
-/// the converter used for each. Where one encoding extends another (GB18030 and GBK, KOI8-U and KOI8-R), it is the wider
-/// one.
+/// the converter used for each. Where one encoding extends another (GB18030 and GBK, KOI8-U and KOI8-R), it is the
+/// wider one.
 struct CodePage {
   int number;
   const char* converter;
