@@ -171,6 +171,7 @@ void IndexCommit(const std::string& share_name) {
 
 void UpdateTermSuggestion(const std::string& db_name, const std::vector<std::string>& fields) {
   std::vector<Json::Value> parts;
+  parts.reserve(fields.size());
   for (const std::string& field : fields) parts.push_back(wire::TermSuggestionRequest(db_name, field));
   SendRequest(wire::CompoundRequest(std::move(parts)));
 }
