@@ -20,7 +20,6 @@ class WriteDebouncer {
   using Report = std::function<void(const std::string& path)>;
 
   /// Keeps at most `max` files.
-
   WriteDebouncer(std::chrono::milliseconds quiet, std::chrono::milliseconds longest, size_t max)
       : quiet_(quiet), longest_(longest), max_(max) {}
 
