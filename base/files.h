@@ -1,8 +1,10 @@
 #pragma once
 
+#include <dirent.h>
 #include <sys/types.h>
 
 #include <cstddef>
+#include <memory>
 #include <string>
 #include <string_view>
 
@@ -20,6 +22,12 @@ bool ReadAll(int fd, std::string& text, size_t limit_bytes = static_cast<size_t>
 
 /// Reads a regular file as a whole into `content`; what is something else fails (EINVAL), and is not waited for.
 bool ReadWholeFile(const std::string& path, std::string& content);
+
+/// An open folder that ends with its owner.
+struct FolderClose {
+  void operator()(DIR* folder) const { (void)closedir(folder); }
+};
+using OpenFolderPtr = std::unique_ptr<DIR, FolderClose>;
 
 /// Makes the names in `folder` durable.
 bool SyncFolder(const std::string& folder);

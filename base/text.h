@@ -71,6 +71,13 @@ inline std::string WithoutControls(std::string_view text, const char* format, st
   return out;
 }
 
+/// A-Z to a-z, whatever the locale; any other byte stays.
+inline char LowerAscii(char c) { return c >= 'A' && c <= 'Z' ? static_cast<char>(c - 'A' + 'a') : c; }
+inline std::string LowerAscii(std::string text) {
+  for (char& c : text) c = LowerAscii(c);
+  return text;
+}
+
 /// Appends a code point as UTF-8; what is none (beyond U+10FFFF, a surrogate) as U+FFFD.
 inline void AppendUtf8(std::string& out, uint32_t code_point) {
   if (code_point < 0x80) {

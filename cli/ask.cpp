@@ -70,7 +70,7 @@ wire::Reply SendCommand(const Daemon& daemon, const std::string& type, const Jso
   return wire::AskDaemon(daemon.socket, type, data, longest);
 }
 
-Json::Value AskEngine(const Json::Value& request, std::chrono::seconds longest) {
+Json::Value AskWithin(const Json::Value& request, std::chrono::seconds longest) {
   return DataOf(kEngine, wire::AskEngine(request, longest));
 }
 
@@ -110,9 +110,9 @@ std::string WhyBehind(const std::vector<std::string>& shares, std::chrono::milli
 
 }  // namespace
 
-Json::Value AskEngine(const Json::Value& request) { return AskEngine(request, kLongestWait); }
+Json::Value AskEngine(const Json::Value& request) { return AskWithin(request, kLongestWait); }
 
-Json::Value Search(const Json::Value& data) { return AskEngine(wire::EngineRequest("search", data), kSearchWait); }
+Json::Value Search(const Json::Value& data) { return AskWithin(wire::EngineRequest("search", data), kSearchWait); }
 
 Json::Value AskIndexDaemon(const std::string& type, const Json::Value& data) {
   return DataOf(kIndexDaemon, SendCommand(kIndexDaemon, type, data));
@@ -174,7 +174,7 @@ std::map<std::string, std::string> AwaitChanges(const std::vector<std::string>& 
 }
 
 /// Waits less than for other commands: it is asked before anything is changed, so that giving up costs nothing.
-void RequireEngine() { (void)AskEngine(wire::EngineRequest("ping"), kStateWait); }
+void RequireEngine() { (void)AskWithin(wire::EngineRequest("ping"), kStateWait); }
 
 void RequireIndexDaemon() { (void)AskIndexDaemon("status", Json::Value()); }
 

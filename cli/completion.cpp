@@ -4,8 +4,8 @@
 
 #include <algorithm>
 #include <cstdio>
-#include <memory>
 
+#include "base/files.h"
 #include "base/path.h"
 #include "cli/command_table.h"
 #include "cli/folder_path.h"
@@ -30,7 +30,7 @@ Words FoldersBelow(const std::string& typed) {
   for (const std::string& share : sdk::SDKShare::Enum()) {
     if (!base::IsAtOrBelow(parent, "/" + share)) continue;
     const std::string folder = sdk::SDKShare(share).GetPath() + parent.substr(1 + share.size());
-    const std::unique_ptr<DIR, int (*)(DIR*)> entries(opendir(folder.c_str()), &closedir);
+    const base::OpenFolderPtr entries(opendir(folder.c_str()));
     if (entries == nullptr) continue;
     while (const dirent* entry = readdir(entries.get())) {
       const std::string name = entry->d_name;

@@ -16,11 +16,17 @@ target_compile_options(ferrox_options INTERFACE -Wall -Wextra -Wshadow -Wnon-vir
 if(CMAKE_CXX_COMPILER_ID STREQUAL Clang)
   target_compile_options(ferrox_options INTERFACE -Wthread-safety -Werror=thread-safety)
 endif()
-if(FERROX_PRECOMPILE AND CMAKE_CXX_COMPILER_ID STREQUAL GNU)
+if(FERROX_FAST_BUILD)
+  # Programs are compiled with the flags of libraries: so they can take the same compiled headers.
+  set(CMAKE_CXX_COMPILE_OPTIONS_PIE ${CMAKE_CXX_COMPILE_OPTIONS_PIC})
+endif()
+if(FERROX_FAST_BUILD AND CMAKE_CXX_COMPILER_ID STREQUAL GNU)
   # GCC 12 takes what std::string copies within itself for out of bounds. It keeps silent where the code is a system
   # header's, which it forgets of a precompiled one; the presets without these keep the warnings.
   target_compile_options(ferrox_options INTERFACE -Wno-array-bounds -Wno-restrict -Wno-stringop-overflow
                                                   -Wno-stringop-overread)
+  # Sources compiled as one count as headers, of which other sources might see another anonymous namespace.
+  target_compile_options(ferrox_options INTERFACE -Wno-subobject-linkage)
 endif()
 if(FERROX_WERROR)
   target_compile_options(ferrox_options INTERFACE -Werror)

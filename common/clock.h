@@ -7,6 +7,8 @@
 
 namespace ferrox {
 
+constexpr int64_t kDaySec = 86400;  ///< a day, in the unit of Clock::Now
+
 /// Time and sleep. All of the library asks the process's one clock, so that a test can decide what time it is and what
 /// a wait costs, and a daemon can make waits end early. Its functions are called by several threads at once; a
 /// replacement must be ready for that.

@@ -1,4 +1,5 @@
-#pragma once
+#ifndef FERROX_COMMON_LOG_H
+#define FERROX_COMMON_LOG_H
 
 #include <string>
 
@@ -51,11 +52,6 @@ FERROX_EXPORT std::string ErrnoText();
 
 }  // namespace ferrox
 
-/// The name under which this source logs. A module that is cut into several files sets it before its includes.
-#ifndef FERROX_SOURCE
-#define FERROX_SOURCE __FILE__
-#endif
-
 /// Logs the failure line for `condition` and throws Error(code, reason...) when it holds; with a Subject as the last
 /// argument, the SubjectError of it. The line shows `text`, for conditions that the log names otherwise than the source
 /// does. The reason is composed only when the condition holds. errno is that of the condition, also in the line; set it
@@ -72,3 +68,11 @@ FERROX_EXPORT std::string ErrnoText();
 /// The same, with the condition as it stands in the source. Not for use inside a lambda, whose name is no help in a
 /// log.
 #define FERROX_FAIL_IF(condition, code, ...) FERROX_FAIL_IF_AS(condition, #condition, code __VA_OPT__(, ) __VA_ARGS__)
+
+#endif  // FERROX_COMMON_LOG_H
+
+/// The name under which this source logs. A module that is cut into several files sets it before its includes. Stands
+/// outside of the guard: of sources that are compiled as one, each has its own, and the build undefines it in between.
+#ifndef FERROX_SOURCE
+#define FERROX_SOURCE __FILE__
+#endif

@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <climits>
 
 #include <kova/fs.h>
 #include <kova/recycle.h>
@@ -15,9 +16,8 @@ namespace ferrox::fileindex {
 
 namespace {
 
-/// The sizes of the platform's buffers, the terminating zero included.
+/// Of the platform's buffer, the terminating zero included.
 constexpr size_t kShareNameBytes = 492;
-constexpr size_t kPathBytes = 4096;
 constexpr int kEveryKindOfUser = 11;
 constexpr int kNeverIndexedFS = KOVA_FS_PSEUDO;
 
@@ -74,7 +74,7 @@ std::string GetFullPath(const std::string& share_path) {
 
 void GetShareNamePathByFullPath(std::string& share_name, std::string& share_path, const std::string& full_path) {
   char name[kShareNameBytes] = {};
-  char path[kPathBytes] = {};
+  char path[PATH_MAX] = {};
   {
     const LockMutex guard(sdk::SDKMutex());
     FERROX_FAIL_IF(0 > KOVAShareNamePathGet(full_path.c_str(), name, sizeof(name), path, sizeof(path)),

@@ -7,6 +7,7 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <climits>
 #include <cstdio>
 #include <vector>
 
@@ -41,7 +42,6 @@ using KOVA::KOVANOTIFYD::MonitorQueue;
 constexpr char kContentExtractd[] = "kovacontentextractd";
 constexpr char kFileIndexd[] = "pkg-Ferrox-fileindexd";
 constexpr char kFileSharing[] = "samba";
-constexpr size_t kPathBytes = 4096;
 
 /// The platform's last failure: its code and where in the platform it arose.
 std::string PlatformError() {
@@ -80,7 +80,7 @@ bool IsRemovable(const std::string& path) {
 /// Where the index of the share with that folder lies; "" when the platform cannot say.
 std::string ComposeDBPath(const std::string& share_path) {
   const LockMutex guard(sdk::SDKMutex());
-  char path[kPathBytes] = {};
+  char path[PATH_MAX] = {};
   return 0 > FILEIDXDBPathCompose(share_path.c_str(), path, sizeof(path)) ? std::string() : path;
 }
 

@@ -1,5 +1,6 @@
 #include "fileindex/queue/queue_file.h"
 
+#include <climits>
 #include <utility>
 
 #include <kova/file_index.h>
@@ -11,13 +12,6 @@
 
 namespace ferrox::fileindex {
 
-namespace {
-
-/// Of the platform's paths, with their zero byte.
-constexpr size_t kPathBytes = 4096;
-
-}  // namespace
-
 std::string DetachedQueuePath(const std::string& queue_path) { return queue_path + ".tmp"; }
 
 std::string AppliedFoldersPath(const std::string& queue_path) { return queue_path + ".folders"; }
@@ -25,7 +19,7 @@ std::string AppliedFoldersPath(const std::string& queue_path) { return queue_pat
 /// Under the process's mutex of the platform's share calls, which must not run at the same time.
 std::string ComposeQueuePath(const std::string& share_path) {
   const LockMutex guard(sdk::SDKMutex());
-  char path[kPathBytes] = {};
+  char path[PATH_MAX] = {};
   return 0 > FILEIDXQueuePathCompose(share_path.c_str(), path, sizeof(path)) ? std::string() : path;
 }
 

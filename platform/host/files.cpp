@@ -57,12 +57,12 @@ int OpenLockFile(const std::string& path) {
 
 /// 0, or why the lock cannot be had: an error number.
 int LockUntil(int fd, std::chrono::steady_clock::time_point deadline) {
-  constexpr int kPollMs = 20;
+  constexpr int kLockPollMs = 20;
   while (flock(fd, LOCK_EX | LOCK_NB) != 0) {
     const int problem = errno;
     const bool is_held = problem == EINTR || problem == EWOULDBLOCK;
     if (!is_held || std::chrono::steady_clock::now() > deadline) return problem;
-    (void)poll(nullptr, 0, kPollMs);
+    (void)poll(nullptr, 0, kLockPollMs);
   }
   return 0;
 }

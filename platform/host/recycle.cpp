@@ -7,6 +7,7 @@
 
 #include <kova/recycle.h>
 
+#include "base/files.h"
 #include "platform/host/account_source.h"
 #include "platform/host/share_table.h"
 #include "platform/shared/failure.h"
@@ -35,10 +36,6 @@ bool IsFolder(const std::string& path) {
   return lstat(path.c_str(), &info) == 0 && S_ISDIR(info.st_mode);
 }
 
-struct FolderClose {
-  void operator()(DIR* folder) const { (void)closedir(folder); }
-};
-
 /// Appends the recycle bins of the homes of those users that `wanted` accepts; a home that cannot be read has none.
 template <typename Wanted>
 int EnumRecyclePaths(KLIBCSzList** list, Wanted wanted) {
@@ -47,7 +44,7 @@ int EnumRecyclePaths(KLIBCSzList** list, Wanted wanted) {
   if (table == nullptr) return -1;
   const ShareEntry* homes = table->ByName(kHomesShare);
   if (homes == nullptr) return 0;
-  const std::unique_ptr<DIR, FolderClose> folder(opendir(homes->path.c_str()));
+  const base::OpenFolderPtr folder(opendir(homes->path.c_str()));
   if (folder == nullptr) return KOVA_FAIL_ERRNO();
   int count = 0;
   errno = 0;

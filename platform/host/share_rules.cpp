@@ -12,6 +12,7 @@
 #include <kova/instance.h>
 
 #include "base/path.h"
+#include "base/text.h"
 
 namespace kova::host {
 
@@ -32,17 +33,10 @@ std::string NameProblem(const std::string& name) {
   return {};
 }
 
-std::string Lower(std::string text) {
-  for (char& c : text) {
-    if (c >= 'A' && c <= 'Z') c = static_cast<char>(c - 'A' + 'a');
-  }
-  return text;
-}
-
 std::string LastComponentProblem(const std::string& name, const std::string& path) {
   const std::string last = base::NameOf(path);
   if (last == name) return {};
-  const std::string hint = Lower(last) == Lower(name) ? " (upper and lower case count)" : "";
+  const std::string hint = base::LowerAscii(last) == base::LowerAscii(name) ? " (upper and lower case count)" : "";
   return "the folder " + path + " is called \"" + last + "\", not \"" + name + "\"" + hint +
          ", and a share is called as its folder: name the share \"" + last +
          "\", or mount the folder under the wanted name (mkdir -p /srv/" + name + " && mount --bind '" + path +

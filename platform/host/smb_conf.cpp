@@ -5,6 +5,8 @@
 #include <unordered_set>
 #include <utility>
 
+#include "base/text.h"
+
 namespace kova::host {
 
 namespace {
@@ -13,8 +15,6 @@ constexpr char kGlobal[] = "global";
 constexpr char kNoSection[] = "\n";  // the name of none: a name has no line feed
 
 bool IsBlank(char c) { return c == ' ' || (c >= '\t' && c <= '\r'); }
-
-char Lower(char c) { return c >= 'A' && c <= 'Z' ? static_cast<char>(c - 'A' + 'a') : c; }
 
 /// Whether only blanks stand between `at` and the end of its line, that is whether a "\" before `at` continues it.
 bool IsLineEnd(const std::string& text, size_t at) {
@@ -40,7 +40,7 @@ std::string CollapseBlanks(const std::string& text) {
 std::string FoldParameter(const std::string& name) {
   std::string out;
   for (const char c : CollapseBlanks(name)) {
-    if (c != ' ') out += Lower(c);
+    if (c != ' ') out += base::LowerAscii(c);
   }
   return out;
 }
@@ -53,11 +53,7 @@ std::string ValueKey(const std::string& folded_section, const std::string& folde
 
 SmbConf::SmbConf(std::string text) : text_(std::move(text)) { Parse(); }
 
-std::string SmbConf::Fold(const std::string& section) {
-  std::string out = CollapseBlanks(section);
-  std::transform(out.begin(), out.end(), out.begin(), &Lower);
-  return out;
-}
+std::string SmbConf::Fold(const std::string& section) { return base::LowerAscii(CollapseBlanks(section)); }
 
 std::optional<bool> SmbConf::Boolean(const std::string& value) {
   const std::string folded = FoldParameter(value);

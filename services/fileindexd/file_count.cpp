@@ -5,22 +5,17 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
-#include <memory>
 #include <utility>
 #include <vector>
 
+#include "base/files.h"
 #include "services/fileindexd/path_rules.h"
 
 namespace ferrox::indexd {
 
 namespace {
 
-struct DirClose {
-  void operator()(DIR* dir) const { (void)closedir(dir); }
-};
-using DirPtr = std::unique_ptr<DIR, DirClose>;
-
-DirPtr OpenFolder(const std::string& path, dev_t& device) {
+base::OpenFolderPtr OpenFolder(const std::string& path, dev_t& device) {
   const int fd = open(path.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC);
   struct stat status = {};
   if (fd < 0 || fstat(fd, &status) != 0) {
@@ -28,7 +23,7 @@ DirPtr OpenFolder(const std::string& path, dev_t& device) {
     return nullptr;
   }
   device = status.st_dev;
-  return DirPtr(fdopendir(fd));
+  return base::OpenFolderPtr(fdopendir(fd));
 }
 
 }  // namespace
@@ -42,7 +37,6 @@ FileCount::~FileCount() {
 }
 
 void FileCount::Count(const std::string& folder) {
-  using Place = ShareFolders::Place;
   std::vector<std::string> waiting = {folder};
   uint64_t files = 0;
   dev_t root_device = 0;
@@ -50,17 +44,17 @@ void FileCount::Count(const std::string& folder) {
     const std::string path = std::move(waiting.back());
     waiting.pop_back();
     dev_t device = 0;
-    const DirPtr dir = OpenFolder(path, device);
+    const base::OpenFolderPtr dir = OpenFolder(path, device);
     if (!dir) continue;
     if (first) root_device = device;
     if (device != root_device || folders_.IsInInner(path)) continue;
-    const bool indexed = folders_.PlaceOf(path) == Place::kIndexed;
+    const bool indexed = folders_.PlaceOf(path) == ShareFolders::Place::kIndexed;
     while (const dirent* entry = readdir(dir.get())) {
       const std::string name = entry->d_name;
       if (name == "." || name == ".." || entry->d_type == DT_LNK || PathRules::SkipName(name)) continue;
-      const Place place = indexed ? Place::kIndexed : folders_.PlaceOf(path + "/" + name);
-      if (place == Place::kIndexed) ++files;
-      if (place != Place::kOutside && entry->d_type == DT_DIR) waiting.push_back(path + "/" + name);
+      const auto place = indexed ? ShareFolders::Place::kIndexed : folders_.PlaceOf(path + "/" + name);
+      if (place == ShareFolders::Place::kIndexed) ++files;
+      if (place != ShareFolders::Place::kOutside && entry->d_type == DT_DIR) waiting.push_back(path + "/" + name);
     }
     if (stop_.Requested()) return;
     status_.SetEstimate(files, false);

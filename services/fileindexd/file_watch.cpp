@@ -16,11 +16,11 @@ namespace ferrox::indexd {
 
 namespace {
 
-using Clock = std::chrono::steady_clock;
+using SteadyClock = std::chrono::steady_clock;
 
 /// Waits until one of two descriptors (-1: none) is readable; false at the end of the time.
-bool WaitReadable(int first, int second, Clock::time_point end) {
-  const auto left = std::chrono::duration_cast<std::chrono::milliseconds>(end - Clock::now()).count();
+bool WaitReadable(int first, int second, SteadyClock::time_point end) {
+  const auto left = std::chrono::duration_cast<std::chrono::milliseconds>(end - SteadyClock::now()).count();
   pollfd polled[] = {{first, POLLIN, 0}, {second, POLLIN, 0}};
   return poll(polled, 2, static_cast<int>(std::clamp<int64_t>(left, 0, 3600 * 1000))) > 0;
 }
@@ -50,7 +50,7 @@ void FileWatch::Watch(const std::string& path) {
 }
 
 void FileWatch::Wait(std::chrono::milliseconds limit) {
-  const auto end = Clock::now() + limit;
+  const auto end = SteadyClock::now() + limit;
   while (WaitReadable(inotify_.Get(), wake_.Get(), end)) {
     const bool woken = DrainWake(wake_.Get());
     if (DrainEvents() || woken) return;
@@ -58,7 +58,7 @@ void FileWatch::Wait(std::chrono::milliseconds limit) {
 }
 
 void FileWatch::WaitForWake(std::chrono::milliseconds limit) {
-  const auto end = Clock::now() + limit;
+  const auto end = SteadyClock::now() + limit;
   if (WaitReadable(-1, wake_.Get(), end)) (void)DrainWake(wake_.Get());
 }
 

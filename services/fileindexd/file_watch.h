@@ -14,8 +14,8 @@ namespace ferrox::indexd {
 /// thread wakes it. One thread waits; Wake is for any.
 class FileWatch {
  public:
-  /// Without inotify (its instances are limited), or where a file's folder is missing, only time and Wake end a wait;
-  /// SeesChanges is false then. @throws Error kInternal.
+  /// Without inotify (its instances are limited), or where a file's folder is missing, only time and Wake end a wait.
+  /// @throws Error kInternal.
   explicit FileWatch(const std::vector<std::string>& paths);
 
   /// Returns after a change of one of the files, after Wake, or after `limit`; a change or a Wake since the last wait
@@ -24,7 +24,9 @@ class FileWatch {
   /// The same for Wake alone.
   void WaitForWake(std::chrono::milliseconds limit);
   void Wake();
-  bool SeesChanges() const { return sees_changes_; }
+  /// The longest wait after which the files should be read again though no change of them was reported: 30 s, and 2 s
+  /// where none is.
+  std::chrono::seconds LongestWait() const { return std::chrono::seconds(sees_changes_ ? 30 : 2); }
 
  private:
   void Watch(const std::string& path);

@@ -22,11 +22,6 @@ namespace ferrox::indexd {
 
 namespace {
 
-/// After this time the configuration is read again whether or not it was seen to change; the short one where inotify
-/// does not report changes.
-constexpr std::chrono::seconds kSlowTimer(30);
-constexpr std::chrono::seconds kSlowTimerWithoutWatch(2);
-
 constexpr int kSyncTimeoutMs = 30 * 1000;
 constexpr int kSyncTimeoutMaxMs = 600 * 1000;
 constexpr char kStopping[] = "the index daemon is being stopped; start it with 'fileindexctl up'";
@@ -116,7 +111,7 @@ void IndexDaemon::Start() {
 /// Not every operation that changes shares or folders sends a command.
 void IndexDaemon::FollowConfiguration() {
   while (!stopping_) {
-    configuration_.Wait(configuration_.SeesChanges() ? kSlowTimer : kSlowTimerWithoutWatch);
+    configuration_.Wait(configuration_.LongestWait());
     if (stopping_) return;
     Reconcile();
     workers_.CheckIndices(SharesBeingRebuilt());

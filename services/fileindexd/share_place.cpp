@@ -5,8 +5,7 @@
 #include <dirent.h>
 #include <fcntl.h>
 
-#include <memory>
-
+#include "base/files.h"
 #include "common/error.h"
 #include "common/file_util.h"
 #include "common/log.h"
@@ -15,13 +14,9 @@ namespace ferrox::indexd {
 
 namespace {
 
-struct DirClose {
-  void operator()(DIR* dir) const { (void)closedir(dir); }
-};
-
 /// False also when it cannot be read.
 bool IsEmptyFolder(const std::string& path) {
-  const std::unique_ptr<DIR, DirClose> dir(opendir(path.c_str()));
+  const base::OpenFolderPtr dir(opendir(path.c_str()));
   if (!dir) return false;
   while (const dirent* entry = readdir(dir.get())) {
     const std::string name = entry->d_name;

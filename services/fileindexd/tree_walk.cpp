@@ -10,6 +10,7 @@
 #include <set>
 #include <string_view>
 
+#include "base/files.h"
 #include "base/unique_fd.h"
 
 namespace ferrox::indexd {
@@ -38,10 +39,6 @@ struct TreeWalk::Level {
 };
 
 namespace {
-
-struct DirClose {
-  void operator()(DIR* dir) const { (void)closedir(dir); }
-};
 
 /// Whether what cannot be opened for this reason holds nothing for the index. Any other reason says nothing about it.
 bool MeansNothingThere(int error) {
@@ -124,7 +121,7 @@ bool TreeWalk::Descend(int parent_fd, const std::string& name, const std::string
 /// Leaves errno at 0 when all names could be read.
 void TreeWalk::ReadNames(Level& level) {
   const int copy = fcntl(level.folder.Get(), F_DUPFD_CLOEXEC, 0);
-  const std::unique_ptr<DIR, DirClose> dir(copy < 0 ? nullptr : fdopendir(copy));
+  const base::OpenFolderPtr dir(copy < 0 ? nullptr : fdopendir(copy));
   if (!dir) return;
   while (true) {
     errno = 0;

@@ -12,13 +12,8 @@ namespace ferrox::indexd {
 namespace {
 
 using std::chrono::milliseconds;
-using std::chrono::seconds;
 using std::chrono::steady_clock;
 
-/// After this time a round begins whether or not the queue was seen to change: the short one where inotify, whose
-/// instances are limited, does not tell of changes.
-constexpr seconds kSlowTimer(30);
-constexpr seconds kSlowTimerWithoutWatch(2);
 /// Rounds while an event is expected.
 constexpr milliseconds kEventPoll(200);
 
@@ -80,7 +75,7 @@ milliseconds WorkerLoop::OnSuccess() {
   settled_ = true;
   context_.syncs.Done(round_.ServedSync());
   context_.status.SetState(ShareStatus::State::kIdle);
-  return context_.watch.SeesChanges() ? kSlowTimer : kSlowTimerWithoutWatch;
+  return context_.watch.LongestWait();
 }
 
 milliseconds WorkerLoop::OnFailure(const Error& error) {

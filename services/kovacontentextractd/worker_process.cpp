@@ -28,7 +28,7 @@ using std::chrono::milliseconds;
 
 constexpr milliseconds kStartMax(10000);
 /// For a process that has closed its socket to be gone.
-constexpr milliseconds kEndMax(2000);
+constexpr milliseconds kReapMax(2000);
 
 /// Rounded up, so that poll does not return just before the time; 0 when it has come.
 int MillisecondsUntil(SteadyClock::time_point end) {
@@ -121,7 +121,7 @@ WorkerProcess::Outcome WorkerProcess::ReceiveSome(char* to, size_t room, TimePoi
 
 /// What the end of a process says about the file that it was reading.
 WorkerProcess::Outcome WorkerProcess::HowItEnded() {
-  const std::optional<int> status = process_.Wait(kEndMax);
+  const std::optional<int> status = process_.Wait(kReapMax);
   if (!process_.End()) return Outcome::kHeld;
   if (!status) return Outcome::kCrashed;
   if (WIFEXITED(*status)) return WEXITSTATUS(*status) == kExitNoMemory ? Outcome::kNoMemory : Outcome::kCrashed;

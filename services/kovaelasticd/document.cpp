@@ -6,6 +6,7 @@
 #include <cstdlib>
 #include <cstring>
 
+#include "base/text.h"
 #include "common/file_util.h"
 #include "common/json_util.h"
 #include "fileindex/util.h"
@@ -141,13 +142,6 @@ std::optional<int64_t> IntMember(const Json::Value& document, const char* name) 
   return member.isInt64() ? std::optional<int64_t>(member.asInt64()) : std::nullopt;
 }
 
-std::string LowerAscii(std::string text) {
-  for (char& c : text) {
-    if (c >= 'A' && c <= 'Z') c = static_cast<char>(c - 'A' + 'a');
-  }
-  return text;
-}
-
 bool IsWanted(const std::vector<std::string>& wanted, const std::string& name) {
   return wanted.empty() || std::find(wanted.begin(), wanted.end(), name) != wanted.end();
 }
@@ -231,7 +225,7 @@ DocRow PackDocument(const std::string& path, const Json::Value& document, const 
   DocRow row;
   row.path = path;
   row.name = TextMember(document, field::kSearchName, TextMember(document, field::kFsName, Basename(path)));
-  row.ext = LowerAscii(TextMember(document, field::kExtension, GetFileExtension(path, true)));
+  row.ext = base::LowerAscii(TextMember(document, field::kExtension, GetFileExtension(path, true)));
   row.size = IntMember(document, field::kSize);
   row.mtime = IntMember(document, field::kContentChangeDate);
   row.error = TextMember(document, field::kExtractError, "");

@@ -6,7 +6,6 @@
 
 #include <cerrno>
 #include <ctime>
-#include <memory>
 #include <vector>
 
 #include "base/files.h"
@@ -23,7 +22,7 @@ constexpr char kSetAside[] = ".damaged-";
 /// What was set aside of the file at `path`.
 std::vector<std::string> SetAsideOf(const std::string& path) {
   std::vector<std::string> found;
-  const std::unique_ptr<DIR, int (*)(DIR*)> folder(opendir(base::FolderOf(path).c_str()), &closedir);
+  const base::OpenFolderPtr folder(opendir(base::FolderOf(path).c_str()));
   if (folder == nullptr) return found;
   while (const dirent* entry = readdir(folder.get())) {
     if (StringStartWith(entry->d_name, Basename(path) + kSetAside))

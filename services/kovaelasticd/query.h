@@ -27,6 +27,9 @@ struct QueryNode {
     kRange,  ///< a number in one of `fields` lies in `low` .. `high`
   };
 
+  QueryNode() = default;
+  explicit QueryNode(Type is) : type(is) {}
+
   Type type = Type::kAll;
   std::vector<QueryNode> children;
   std::string text;  ///< as written, without quotes

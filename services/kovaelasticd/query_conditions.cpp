@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <optional>
 
+#include "base/text.h"
 #include "common/error.h"
 #include "services/kovaelasticd/query_values.h"
 #include "services/kovaelasticd/schema.h"
@@ -13,20 +14,8 @@ namespace ferrox::engine {
 
 namespace {
 
-std::string LowerAscii(std::string text) {
-  std::transform(text.begin(), text.end(), text.begin(),
-                 [](char c) { return c >= 'A' && c <= 'Z' ? static_cast<char>(c | 0x20) : c; });
-  return text;
-}
-
-QueryNode Node(QueryNode::Type type) {
-  QueryNode node;
-  node.type = type;
-  return node;
-}
-
 QueryNode RangeNode(QueryNode::Type type, const ValueRange& range) {
-  QueryNode node = Node(type);
+  QueryNode node(type);
   node.low = range.low;
   node.high = range.high;
   return node;
@@ -46,11 +35,11 @@ QueryNode ConditionReader::Words(QueryNode::Type type, const ConditionValue& val
     Refuse(value.begin, "a \"*\" can stand only at the end of a word; name:port finds it inside names too");
   }
   const QueryWords words = SplitQueryText(value.text, value.prefix);
-  if (words.words.empty()) return Node(QueryNode::Type::kAll);
+  if (words.words.empty()) return QueryNode(QueryNode::Type::kAll);
   if (value.prefix && words.words.back().size() < 2) {
     Refuse(value.begin, "the beginning of a word must have two letters at least; add some before the \"*\"");
   }
-  QueryNode node = Node(type);
+  QueryNode node(type);
   node.text = value.text;
   node.phrase = value.phrase;
   node.prefix = value.prefix;
@@ -58,7 +47,7 @@ QueryNode ConditionReader::Words(QueryNode::Type type, const ConditionValue& val
 }
 
 QueryNode ConditionReader::Field(const std::string& name, size_t begin, const ConditionValue& value) const {
-  const std::string lower = LowerAscii(name);
+  const std::string lower = base::LowerAscii(name);
   if (lower == "kind") return Kinds(value);
   if (lower == "ext" || name == field::kExtension) return Extensions(value);
   if (lower == "path") return Path(value);
@@ -110,7 +99,7 @@ QueryNode ConditionReader::Name(ConditionValue value) const {
 }
 
 QueryNode ConditionReader::Kinds(const ConditionValue& value) const {
-  QueryNode node = Node(QueryNode::Type::kKind);
+  QueryNode node(QueryNode::Type::kKind);
   for (const std::string& part : Parts(value)) {
     const std::optional<int32_t> kind = ParseKind(part);
     if (!kind.has_value()) {
@@ -123,10 +112,10 @@ QueryNode ConditionReader::Kinds(const ConditionValue& value) const {
 }
 
 QueryNode ConditionReader::Extensions(const ConditionValue& value) const {
-  QueryNode either = Node(QueryNode::Type::kOr);
+  QueryNode either(QueryNode::Type::kOr);
   for (const std::string& part : Parts(value)) {
-    QueryNode node = Node(QueryNode::Type::kExt);
-    node.text = LowerAscii(part.front() == '.' ? part.substr(1) : part);
+    QueryNode node(QueryNode::Type::kExt);
+    node.text = base::LowerAscii(part.front() == '.' ? part.substr(1) : part);
     either.children.push_back(std::move(node));
   }
   if (either.children.size() > 1) return either;
@@ -153,7 +142,7 @@ QueryNode ConditionReader::Path(const ConditionValue& value) const {
   if (value.text.front() != '/') {
     Refuse(value.begin, "path: takes the full path of a folder, such as path:/volume1/photo; begin it with /");
   }
-  QueryNode node = Node(QueryNode::Type::kPath);
+  QueryNode node(QueryNode::Type::kPath);
   node.text = value.text;
   while (!node.text.empty() && node.text.back() == '/') node.text.pop_back();
   return node;

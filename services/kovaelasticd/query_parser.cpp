@@ -15,12 +15,6 @@ bool IsNameChar(char c) {
   return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z') || (c >= '0' && c <= '9') || c == '_';
 }
 
-QueryNode Node(QueryNode::Type type) {
-  QueryNode node;
-  node.type = type;
-  return node;
-}
-
 /// Reads the grammar, by recursive descent; a ConditionReader reads the single conditions.
 ///
 ///   or        = and { "OR" and }
@@ -67,7 +61,7 @@ class Parser {
   }
 
   QueryNode ParseOr() {
-    QueryNode either = Node(QueryNode::Type::kOr);
+    QueryNode either(QueryNode::Type::kOr);
     do {
       const size_t begin = pos_;
       either.children.push_back(ParseAnd());
@@ -88,7 +82,7 @@ class Parser {
   }
 
   QueryNode ParseAnd() {
-    QueryNode all = Node(QueryNode::Type::kAnd);
+    QueryNode all(QueryNode::Type::kAnd);
     while (!AtEnd()) {
       const size_t begin = pos_;
       if (TakeKeyword("OR")) {
@@ -116,11 +110,11 @@ class Parser {
     }
     if (AtEnd()) conditions_.Refuse(begin, "NOT needs a condition behind it; add one");
     Deeper(begin);
-    QueryNode node = Node(QueryNode::Type::kNot);
+    QueryNode node(QueryNode::Type::kNot);
     node.children.push_back(ParseUnary());
     --depth_;
     // What asks for nothing excludes nothing.
-    return node.children.front().type == QueryNode::Type::kAll ? Node(QueryNode::Type::kAll) : node;
+    return node.children.front().type == QueryNode::Type::kAll ? QueryNode(QueryNode::Type::kAll) : node;
   }
 
   void Deeper(size_t begin) {
@@ -140,7 +134,7 @@ class Parser {
       ++pos_;
       --depth_;
       const bool empty = inner.type == QueryNode::Type::kAnd && inner.children.empty();
-      return empty ? Node(QueryNode::Type::kAll) : inner;
+      return empty ? QueryNode(QueryNode::Type::kAll) : inner;
     }
     std::string name;
     size_t end = pos_;

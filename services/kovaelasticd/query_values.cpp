@@ -8,6 +8,7 @@
 #include <limits>
 #include <utility>
 
+#include "common/clock.h"
 #include "services/kovaelasticd/document.h"
 #include "wire/fields.h"
 
@@ -19,7 +20,6 @@ namespace names = fileindex::elastic;
 
 constexpr int64_t kMin = std::numeric_limits<int64_t>::min();
 constexpr int64_t kMax = std::numeric_limits<int64_t>::max();
-constexpr int64_t kDaySec = 86400;
 /// For the texts of an account's record; a group with many members needs much.
 constexpr size_t kAccountBufferBytes = 64 << 10;
 

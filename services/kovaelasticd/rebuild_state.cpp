@@ -2,15 +2,10 @@
 
 #include <algorithm>
 
+#include "common/clock.h"
 #include "common/json_util.h"
 
 namespace ferrox::engine {
-
-namespace {
-
-constexpr int64_t kDaySec = 86400;
-
-}  // namespace
 
 bool RebuildState::MayBegin(int64_t now) const {
   const auto is_recent = [now](int64_t time) { return time > now - kDaySec && time <= now; };

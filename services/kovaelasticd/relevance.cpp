@@ -16,7 +16,6 @@ namespace {
 /// blocks are the same whichever page is asked for, so pages neither repeat nor miss a hit; a page reads the lengths
 /// and dates of the one to three blocks that it touches, about 1 ms each.
 constexpr size_t kCloseBlock = 500;
-constexpr int64_t kDaySec = 86400;
 
 /// What a word's places beside the content add to the score, in the measure of CountValue. The values are set by hand:
 /// a word in the name outweighs any number of occurrences in a text.

@@ -4,6 +4,7 @@
 
 #include <algorithm>
 
+#include "base/text.h"
 #include "common/log.h"
 
 namespace ferrox::engine {
@@ -12,8 +13,6 @@ namespace {
 
 /// More names than that come from no extractor.
 constexpr int64_t kFieldNamesMax = 4096;
-
-unsigned char LowerAscii(char c) { return static_cast<unsigned char>(c >= 'A' && c <= 'Z' ? c + ('a' - 'A') : c); }
 
 }  // namespace
 
@@ -109,9 +108,10 @@ void PrefixRange::Bind(Statement& statement) const {
 }
 
 int CompareNames(std::string_view a, std::string_view b) {
+  const auto byte = [](char c) { return static_cast<unsigned char>(base::LowerAscii(c)); };
   const size_t common = std::min(a.size(), b.size());
   for (size_t i = 0; i < common; ++i) {
-    const int difference = LowerAscii(a[i]) - LowerAscii(b[i]);
+    const int difference = byte(a[i]) - byte(b[i]);
     if (difference != 0) return difference;
   }
   return a.size() == b.size() ? 0 : a.size() < b.size() ? -1 : 1;

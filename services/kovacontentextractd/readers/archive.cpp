@@ -22,7 +22,7 @@ namespace {
 // end, and need not be searched for.
 
 /// How much the library is given at a time.
-constexpr size_t kPieceBytes = 64U << 10;
+constexpr size_t kArchivePieceBytes = 64U << 10;
 /// Of a packed archive, all must be unpacked to find the names in it: no more than takes a few seconds.
 constexpr int64_t kUnpackedMaxBytes = 1LL << 30;
 constexpr int kNamesMax = 200000;
@@ -33,7 +33,7 @@ struct Free {
 
 /// What the library reads from.
 struct Input {
-  explicit Input(const Source& source) : file(source), piece(kPieceBytes) {}
+  explicit Input(const Source& source) : file(source), piece(kArchivePieceBytes) {}
   FileBytes file;
   uint64_t at = 0;
   std::vector<char> piece;

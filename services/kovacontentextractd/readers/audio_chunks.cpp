@@ -13,7 +13,7 @@ namespace ferrox::extract {
 
 namespace {
 
-constexpr size_t kTextMaxBytes = 64U << 10;
+constexpr size_t kChunkTextMaxBytes = 64U << 10;
 constexpr int kChunksMax = 1000;
 
 /// What a format's head says of its sound.
@@ -99,7 +99,7 @@ void EachChunk(const FileBytes& file, uint64_t at, size_t size_bytes, bool even,
 
 /// A chunk's content, as far as a text may be long.
 std::string TextOf(const FileBytes& file, const Chunk& chunk) {
-  return file.ReadAt(chunk.at, static_cast<size_t>(std::min<uint64_t>(chunk.size, kTextMaxBytes)));
+  return file.ReadAt(chunk.at, static_cast<size_t>(std::min<uint64_t>(chunk.size, kChunkTextMaxBytes)));
 }
 
 /// The chunk "desc": rate (a double, 8 bytes), codec (4, at 8), flags (4), bytes of a packet (4, at 10), frames of a

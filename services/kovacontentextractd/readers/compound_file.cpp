@@ -10,9 +10,9 @@ namespace ferrox::extract {
 namespace {
 
 constexpr std::string_view kMark = "\xD0\xCF\x11\xE0\xA1\xB1\x1A\xE1";
-constexpr size_t kHeaderBytes = 512;
+constexpr size_t kCompoundHeaderBytes = 512;
 constexpr uint32_t kLastSector = 0xFFFFFFFA;  ///< numbers beyond it have other meanings: end, free
-constexpr size_t kEntryBytes = 128;
+constexpr size_t kFolderEntryBytes = 128;
 constexpr uint8_t kStorageType = 1, kStreamType = 2;  // the root is 5
 
 /// Names are compared without case: some programs write all of them in capitals.
@@ -26,7 +26,7 @@ constexpr uint64_t kTableMax = 8U << 20;  ///< sectors: a file of 4 GiB
 /// Of one stream, what may be read.
 constexpr uint64_t kStreamMaxBytes = 128U << 20;
 /// How much a small read of a stream reads ahead.
-constexpr size_t kPieceBytes = 4096;
+constexpr size_t kSectorsPieceBytes = 4096;
 
 }  // namespace
 
@@ -56,11 +56,11 @@ std::string CompoundStream::ReadAt(uint64_t offset, size_t size) const {
 
 size_t CompoundStream::Read(char* buffer, size_t room) {
   size_t got = 0;
-  if (room >= kPieceBytes) {
+  if (room >= kSectorsPieceBytes) {
     got = ReadAt(at_, buffer, room);
   } else {
     if (at_ < piece_at_ || at_ + room > piece_at_ + piece_.size()) {
-      piece_ = ReadAt(at_, kPieceBytes);
+      piece_ = ReadAt(at_, kSectorsPieceBytes);
       piece_at_ = at_;
     }
     got = std::string_view(piece_).substr(static_cast<size_t>(at_ - piece_at_)).copy(buffer, room);
@@ -71,10 +71,10 @@ size_t CompoundStream::Read(char* buffer, size_t room) {
 
 CompoundFile::CompoundFile(const Source& source) : file_(source) {
   mini_stream_.file_ = this;
-  const std::string header = file_.ReadAt(0, kHeaderBytes);
+  const std::string header = file_.ReadAt(0, kCompoundHeaderBytes);
   sector_shift_ = Little16(header, 0x1E);
   mini_shift_ = Little16(header, 0x20);
-  const bool sane = header.size() == kHeaderBytes && header.starts_with(kMark) && sector_shift_ >= 7 &&
+  const bool sane = header.size() == kCompoundHeaderBytes && header.starts_with(kMark) && sector_shift_ >= 7 &&
                     sector_shift_ <= 16 && mini_shift_ >= 4 && mini_shift_ <= sector_shift_;
   if (!sane) return;
   mini_cutoff_ = Little32(header, 0x38);
@@ -142,10 +142,11 @@ void CompoundFile::ReadMiniTable(uint32_t first) {
 /// 42), the numbers of its left and right neighbour in the tree and of the first entry within it (at 44, 48, 4C), its
 /// first sector (at 74) and size (at 78, of which the upper half is not read).
 void CompoundFile::ReadEntries(uint32_t first) {
-  for (const uint32_t sector : Chain(table_, first, kEntriesMax * kEntryBytes, sector_shift_)) {
+  for (const uint32_t sector : Chain(table_, first, kEntriesMax * kFolderEntryBytes, sector_shift_)) {
     const std::string bytes = ReadSector(sector);
-    for (size_t at = 0; at + kEntryBytes <= bytes.size() && entries_.size() < kEntriesMax; at += kEntryBytes) {
-      const std::string_view entry = std::string_view(bytes).substr(at, kEntryBytes);
+    for (size_t at = 0; at + kFolderEntryBytes <= bytes.size() && entries_.size() < kEntriesMax;
+         at += kFolderEntryBytes) {
+      const std::string_view entry = std::string_view(bytes).substr(at, kFolderEntryBytes);
       const size_t name_bytes = std::min<size_t>(Little16(entry, 64), 64);
       Entry& added = entries_.emplace_back();
       added.name = FromUtf16Little(entry.substr(0, name_bytes < 2 ? 0 : name_bytes - 2));

@@ -17,7 +17,7 @@ constexpr size_t kFieldMaxBytes = 32U << 10;
 /// Values of lists, of all fields together: each is compared with those before it.
 constexpr int kAppendMax = 50000;
 /// Of an attachment's name, the end: what matters of it is the extension.
-constexpr size_t kNameMaxBytes = 255;
+constexpr size_t kFieldNameMaxBytes = 255;
 constexpr std::string_view kLongField = "not all of a long field";
 constexpr std::string_view kBetweenValues = ", ";
 constexpr std::string_view kReplacement = "\xEF\xBF\xBD";
@@ -123,7 +123,7 @@ void Findings::Attach(Attachment attachment) {
   if (attachment.bytes.empty()) return;
   if (attachment.bytes.size() > AttachmentRoom()) return Omit("not all of its attachments");
   attached_bytes_ += attachment.bytes.size();
-  const size_t begin = attachment.name.size() - std::min(attachment.name.size(), kNameMaxBytes);
+  const size_t begin = attachment.name.size() - std::min(attachment.name.size(), kFieldNameMaxBytes);
   bool cut = false;
   attachment.name = FieldValue(std::string_view(attachment.name).substr(begin), cut);
   attachments_.push_back(std::move(attachment));

@@ -29,7 +29,7 @@ namespace {
 constexpr int kMessagesMax = 20000;
 constexpr std::chrono::milliseconds kCpuMax(4000);
 // Of one message.
-constexpr int kPartsMax = 1000;
+constexpr int kMailPartsMax = 1000;
 constexpr int kLevelsMax = 16;
 constexpr int kAddressesMax = 500;
 constexpr size_t kPartMaxBytes = 2U << 20;
@@ -143,7 +143,7 @@ class MailReader {
   /// A node of the tree, of whatever kind. `level` is its depth. False when the findings take no more.
   bool AddObject(GMimeObject* object, int level) {
     if (object == nullptr) return true;
-    if (level > kLevelsMax || ++parts_ > kPartsMax) return LeaveOut("not all of its parts");
+    if (level > kLevelsMax || ++parts_ > kMailPartsMax) return LeaveOut("not all of its parts");
     if (GMIME_IS_MULTIPART(object)) return AddMultipart(GMIME_MULTIPART(object), level);
     if (GMIME_IS_MESSAGE_PART(object)) {
       return AddInnerMessage(g_mime_message_part_get_message(GMIME_MESSAGE_PART(object)), level);
@@ -168,7 +168,7 @@ class MailReader {
 
   bool AddMultipart(GMimeMultipart* multipart, int level) {
     GMimeContentType* type = g_mime_object_get_content_type(GMIME_OBJECT(multipart));
-    const int count = std::min(g_mime_multipart_get_count(multipart), kPartsMax);
+    const int count = std::min(g_mime_multipart_get_count(multipart), kMailPartsMax);
     if (Is(type, "multipart", "alternative")) {
       if (GMimeObject* plain = PlainAlternative(multipart, count)) return AddAlternatives(multipart, plain, level);
     }
@@ -196,7 +196,7 @@ class MailReader {
     if (!AddObject(plain, level + 1)) return false;
     const size_t outer = std::exchange(plain_bytes_, std::max<size_t>(1, findings_.Text().size() - before));
     bool more = true;
-    const int count = std::min(g_mime_multipart_get_count(multipart), kPartsMax);
+    const int count = std::min(g_mime_multipart_get_count(multipart), kMailPartsMax);
     for (int i = 0; more && i < count; ++i) {
       GMimeObject* part = g_mime_multipart_get_part(multipart, i);
       if (part != plain) more = AddObject(part, level + 1);

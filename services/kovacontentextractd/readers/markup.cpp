@@ -19,18 +19,18 @@ using namespace std::literals;
 // for ahead (the end of a comment, a closing quote) is searched for once, or remembered.
 
 constexpr size_t kTitleMaxBytes = 1024;
-constexpr size_t kAttributeMaxBytes = 64 * 1024;
+constexpr size_t kMarkupAttributeMaxBytes = 64 * 1024;
 /// Of a reference to a character, with "&" and ";".
-constexpr size_t kReferenceMaxBytes = 32;
+constexpr size_t kMarkupReferenceMaxBytes = 32;
 constexpr size_t kNotFound = std::string_view::npos;
 
 char Lower(char c) { return c >= 'A' && c <= 'Z' ? static_cast<char>(c - 'A' + 'a') : c; }
 
-bool IsBlank(char c) { return c == ' ' || c == '\t' || c == '\n' || c == '\r' || c == '\f'; }
+bool IsHtmlBlank(char c) { return c == ' ' || c == '\t' || c == '\n' || c == '\r' || c == '\f'; }
 
 /// The bytes of the blank at `at`, a no-break space among them; 0 when there is none.
 size_t BlankLength(std::string_view text, size_t at) {
-  if (IsBlank(text[at])) return 1;
+  if (IsHtmlBlank(text[at])) return 1;
   return text[at] == '\xC2' && at + 1 < text.size() && text[at + 1] == '\xA0' ? 2 : 0;
 }
 
@@ -131,9 +131,9 @@ bool IsCell(std::string_view name) { return name == "td" || name == "th" || name
 
 /// Reads one document. HTML and XML differ in what they forgive: HTML has names without case, elements within a line
 /// and raw text in scripts; XML has prefixes, declarations within a document type, and "<" begins a tag anywhere.
-class Reader {
+class MarkupReader {
  public:
-  Reader(std::string_view source, size_t limit_bytes, bool html)
+  MarkupReader(std::string_view source, size_t limit_bytes, bool html)
       : source_(source), html_(html), text_(limit_bytes), title_(kTitleMaxBytes) {}
 
   MarkupText Read() {
@@ -237,7 +237,7 @@ class Reader {
       if (c == '<' && !html_) return false;  // the tag was not closed; the next one begins here
       ++at_;
       if (before == '=' && (c == '"' || c == '\'')) SkipQuoted(c);
-      if (!IsBlank(c)) before = c;
+      if (!IsHtmlBlank(c)) before = c;
     }
     return false;
   }
@@ -246,7 +246,7 @@ class Reader {
   void SkipQuoted(char quote) {
     const size_t close = (quote == '"' ? next_double_ : next_single_).Find(source_, at_);
     const bool is_file = StartsWithNoCase(source_.substr(at_), "data:"sv);
-    if (close < source_.size() && (is_file || close - at_ <= kAttributeMaxBytes)) at_ = close + 1;
+    if (close < source_.size() && (is_file || close - at_ <= kMarkupAttributeMaxBytes)) at_ = close + 1;
   }
 
   /// What an element's begin or end does to the text: opens or closes the title, drops what is not for people,
@@ -285,7 +285,7 @@ class Reader {
 
   /// Resolves the reference that the text begins with; returns its length. What is none stands for itself.
   size_t AddReference(std::string_view text, TextSink& sink) const {
-    const size_t end = text.substr(0, kReferenceMaxBytes).find(';');
+    const size_t end = text.substr(0, kMarkupReferenceMaxBytes).find(';');
     const uint32_t code_point = end == kNotFound ? 0 : Resolve(text.substr(1, end - 1));
     if (code_point == 0) {
       sink.Add("&"sv);
@@ -353,9 +353,13 @@ std::string ValueAfter(std::string_view text, std::string_view key) {
 
 }  // namespace
 
-MarkupText ReadHtml(std::string_view source, size_t limit_bytes) { return Reader(source, limit_bytes, true).Read(); }
+MarkupText ReadHtml(std::string_view source, size_t limit_bytes) {
+  return MarkupReader(source, limit_bytes, true).Read();
+}
 
-MarkupText ReadXml(std::string_view source, size_t limit_bytes) { return Reader(source, limit_bytes, false).Read(); }
+MarkupText ReadXml(std::string_view source, size_t limit_bytes) {
+  return MarkupReader(source, limit_bytes, false).Read();
+}
 
 std::string DeclaredHtmlEncoding(std::string_view head) {
   head = head.substr(0, 4096);

@@ -17,7 +17,7 @@ namespace {
 // bytes, at most 8224 in BIFF8), the content. All numbers have their low byte first. Since Excel 5 the records are the
 // stream "Workbook" or "Book" of a compound file; before, they are the file itself. Read are: cells, notes, texts of
 // drawings and charts, names of sheets; of formulas the result, never the expression.
-enum RecordType : uint16_t {
+enum BookRecord : uint16_t {
   kBof2 = 0x0009,  // of Excel 2, and what follows it: of 3 and 4
   kBof3 = 0x0209,
   kBof4 = 0x0409,

@@ -15,7 +15,7 @@ namespace {
 // instance (2 bytes, 15 in the low 4 bits for a record that holds others), type (2), size of the content (4). Text
 // stands in two types of record, in UTF-16 or in its low bytes; a file that was saved fast has old versions of slides
 // too, whose text is read as well.
-enum RecordType : uint16_t {
+enum SlideRecord : uint16_t {
   kMainMaster = 0x03F8,  ///< "Click to edit the title", not the author's words
   kHandout = 0x0FC9,
   kTextUtf16 = 0x0FA0,
@@ -25,7 +25,7 @@ enum RecordType : uint16_t {
   kExtension = 0x138B,  ///< holds what later versions of the program added, comments among it
   kComment = 0x2EE0,
 };
-constexpr size_t kTextMaxBytes = 1U << 20;  ///< of one record
+constexpr size_t kSlideTextMaxBytes = 1U << 20;  ///< of one record
 
 /// The stream "Current User" has a token at 0C that differs for an encrypted document.
 bool IsEncrypted(const CompoundFile& file) {
@@ -87,7 +87,7 @@ class SlideReader {
   }
 
   bool AddText(uint16_t type, uint64_t size) {
-    std::string bytes(static_cast<size_t>(std::min<uint64_t>({size, stream_.Left(), kTextMaxBytes})), '\0');
+    std::string bytes(static_cast<size_t>(std::min<uint64_t>({size, stream_.Left(), kSlideTextMaxBytes})), '\0');
     bytes.resize(stream_.Read(bytes.data(), bytes.size()));
     return AddLines(type == kTextBytes ? FromLowBytes(bytes) : FromUtf16Little(bytes), findings_);
   }

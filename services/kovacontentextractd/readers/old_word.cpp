@@ -16,7 +16,7 @@ namespace {
 // the stream "0Table" or "1Table" at the place and with the size at 1A2 and 1A6, that of Word 6 and 95 in the document
 // itself (at 160 and 164) and only where the file was saved fast, which appends changes. Read is the whole text, with
 // footnotes, headers and comments, which follow the main text in the same numbering of characters.
-constexpr size_t kHeaderBytes = 1024;
+constexpr size_t kWordHeaderBytes = 1024;
 constexpr size_t kPieceBytes = 32U << 10;
 /// Of a table of pieces, what is read: 700,000 pieces.
 constexpr uint32_t kPieceTableMax = 8U << 20;
@@ -169,7 +169,7 @@ void AddPieces(const CompoundStream& document, const std::string& table, const F
 
 void ReadOldWord(const CompoundFile& file, Findings& findings) {
   const auto document = file.Open("WordDocument");
-  const std::string header = document->ReadAt(0, kHeaderBytes);
+  const std::string header = document->ReadAt(0, kWordHeaderBytes);
   if (header.size() < 0x20) return findings.Fail("damaged");
   if ((Little16(header, 0x0A) & 0x0100) != 0) return findings.Fail("encrypted");
   const Form form = FormOf(file, header);

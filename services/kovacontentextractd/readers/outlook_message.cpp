@@ -16,16 +16,16 @@ namespace {
 // attachments have storages with such streams of their own. Properties of fixed size stand in a table, the stream
 // "__properties_version1.0". The numbers used here are 0037 subject, 0C1A sender's name, 5D01 sender's address, 0E04
 // and 0E03 those that it was sent and copied to, 1000 the text, 1013 the same as HTML.
-constexpr size_t kValueMaxBytes = 2U << 20;
+constexpr size_t kPropertyStreamMaxBytes = 2U << 20;
 
 /// A property's text by its number: in UTF-16, or in bytes of an encoding that the file does not name.
 std::string TextOf(const CompoundFile& file, const std::string& number, uint32_t storage = CompoundFile::kRoot) {
   if (const auto wide = file.Open("__substg1.0_" + number + "001F", storage)) {
-    return FromUtf16Little(wide->ReadAt(0, kValueMaxBytes));
+    return FromUtf16Little(wide->ReadAt(0, kPropertyStreamMaxBytes));
   }
   const auto narrow = file.Open("__substg1.0_" + number + "001E", storage);
   DecodedText decoded;
-  if (narrow != nullptr) (void)Decode(narrow->ReadAt(0, kValueMaxBytes), true, {}, decoded);
+  if (narrow != nullptr) (void)Decode(narrow->ReadAt(0, kPropertyStreamMaxBytes), true, {}, decoded);
   return decoded.text;
 }
 
@@ -82,7 +82,7 @@ void ReadOutlookMessage(const CompoundFile& file, Findings& findings) {
   std::string body = TextOf(file, "1000");
   const auto html = body.empty() ? file.Open("__substg1.0_10130102") : nullptr;
   DecodedText decoded;
-  if (html != nullptr && Decode(html->ReadAt(0, kValueMaxBytes), true, {}, decoded)) {
+  if (html != nullptr && Decode(html->ReadAt(0, kPropertyStreamMaxBytes), true, {}, decoded)) {
     body = ReadHtml(decoded.text, findings.Bounds().text_bytes).text;
   }
   (void)findings.AddText(body);

@@ -13,7 +13,7 @@ namespace {
 
 using Token = XmlTokenizer::Token;
 
-constexpr size_t kValueMaxBytes = 32U << 10;
+constexpr size_t kPropertyMaxBytes = 32U << 10;
 constexpr int kPropertiesMax = 20000;
 
 void SetTime(const char* field, std::string_view value, Findings& findings) {
@@ -45,7 +45,7 @@ void AddPropertyFields(ByteSource& source, std::span<const PropertyField> fields
   int found = 0;
   for (Token token; found < kPropertiesMax && xml.Next(token);) {
     if (token == Token::kOpen) value.clear();
-    if (token == Token::kText && value.size() < kValueMaxBytes) value += xml.Text();
+    if (token == Token::kText && value.size() < kPropertyMaxBytes) value += xml.Text();
     if (token != Token::kClose) continue;
     for (const PropertyField& property : fields) {
       if (property.element != xml.Name()) continue;

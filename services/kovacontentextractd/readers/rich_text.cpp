@@ -30,10 +30,10 @@ using namespace std::literals;
 constexpr size_t kDepthMax = 2000;
 constexpr size_t kFontsMax = 10000;
 /// How much text is collected before it is handed on, and the longest text of a field.
-constexpr size_t kPieceBytes = 32U << 10;
+constexpr size_t kRichPieceBytes = 32U << 10;
 constexpr int kMacRoman = 10000;
 /// The processor time for one file. Pictures are most of a long file, written in hexadecimal digits.
-constexpr std::chrono::milliseconds kCpuMax(1500);
+constexpr std::chrono::milliseconds kRichCpuMax(1500);
 
 /// Where text goes in a group.
 enum class Target : uint8_t { kText, kNowhere, kFontTable, kField };
@@ -328,7 +328,7 @@ class RichTextReader {
     }
     if (Top().target == Target::kNowhere || Top().target == Target::kFontTable) return;
     bytes_ += byte;
-    if (bytes_.size() >= kPieceBytes) FlushBytes();
+    if (bytes_.size() >= kRichPieceBytes) FlushBytes();
   }
 
   /// "\u": one unit of UTF-16; characters beyond U+FFFF are two of them.
@@ -350,7 +350,7 @@ class RichTextReader {
     FlushBytes();
     std::string* out = Out();
     if (out != nullptr) AppendUtf8(*out, code);
-    if (text_.size() >= kPieceBytes) FlushText();
+    if (text_.size() >= kRichPieceBytes) FlushText();
   }
 
   /// Bytes become text when it is known that no more of their encoding follow.
@@ -359,13 +359,13 @@ class RichTextReader {
     std::string* out = Out();
     if (out != nullptr) *out += FromCodePage(bytes_, Top().code_page);
     bytes_.clear();
-    if (text_.size() >= kPieceBytes) FlushText();
+    if (text_.size() >= kRichPieceBytes) FlushText();
   }
 
   /// Where the group's text goes; null when it is dropped.
   std::string* Out() {
     if (Top().target == Target::kText) return &text_;
-    return Top().target == Target::kField && value_.size() < kPieceBytes ? &value_ : nullptr;
+    return Top().target == Target::kField && value_.size() < kRichPieceBytes ? &value_ : nullptr;
   }
 
   void FlushText() {
@@ -382,7 +382,7 @@ class RichTextReader {
   Findings& findings_;
   std::array<char, 16384> buffer_;
   size_t at_ = 0, size_ = 0;
-  const CpuBudget budget_{kCpuMax};
+  const CpuBudget budget_{kRichCpuMax};
   std::vector<Group> groups_;
   std::map<int, int> fonts_;  ///< their code pages
   int font_ = 0;              ///< the one in the table that is being read

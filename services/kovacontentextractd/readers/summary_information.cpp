@@ -15,7 +15,7 @@ namespace {
 // below are those of the two sets that each office document has.
 constexpr size_t kSetMaxBytes = 1U << 20;
 constexpr size_t kTextMaxBytes = 64U << 10;
-constexpr uint32_t kPropertiesMax = 1000;
+constexpr uint32_t kNumberedMax = 1000;
 constexpr int kValuesMax = 100;  ///< of those that are wanted: a set has each once
 constexpr uint32_t kCodePageId = 1;
 enum ValueType : uint32_t { kInt16 = 2, kInt32 = 3, kBytes = 30, kUtf16 = 31, kFileTime = 64 };
@@ -65,7 +65,7 @@ void SetValue(std::string_view set, size_t at, int code_page, const char* field,
 /// Calls `take` with the id of each property and the place of its value.
 template <typename Take>
 void ForEachProperty(std::string_view set, Take take) {
-  const uint32_t count = std::min(Little32(set, 4), kPropertiesMax);
+  const uint32_t count = std::min(Little32(set, 4), kNumberedMax);
   for (uint32_t i = 0; i < count; ++i) take(Little32(set, 8 + i * 8), Little32(set, 12 + i * 8));
 }
 

@@ -18,7 +18,7 @@ using Token = XmlTokenizer::Token;
 // not where cells use them, so each occurs once however many cells have it.
 
 constexpr size_t kSheetsMax = 10000;
-constexpr size_t kStylesMax = 65536;
+constexpr size_t kSheetStylesMax = 65536;
 
 /// What reading a sheet needs of the other parts.
 struct Workbook {
@@ -53,14 +53,14 @@ void ReadStyles(ZipContainer& zip, const std::string& part, Workbook& workbook) 
     if (token == Token::kText) return true;
     if (xml.Name() == "cellXfs") {
       in_cell_styles = token == Token::kOpen;
-    } else if (token == Token::kOpen && xml.Name() == "numFmt" && formats.size() < kStylesMax) {
+    } else if (token == Token::kOpen && xml.Name() == "numFmt" && formats.size() < kSheetStylesMax) {
       formats[ToInt(xml.Attribute("numFmtId"))] = ParseNumberFormat(xml.Attribute("formatCode"));
     } else if (token == Token::kOpen && in_cell_styles && xml.Name() == "xf") {
       const int id = ToInt(xml.Attribute("numFmtId"));
       const auto own = formats.find(id);
       workbook.styles.push_back(own != formats.end() ? own->second : BuiltInNumberFormat(id));
     }
-    return workbook.styles.size() < kStylesMax;
+    return workbook.styles.size() < kSheetStylesMax;
   });
 }
 

@@ -13,7 +13,7 @@ using namespace std::literals;
 
 // What is kept of each thing in a document; the rest is read and dropped.
 constexpr size_t kNameMaxBytes = 128;
-constexpr size_t kValueMaxBytes = 16U << 10;
+constexpr size_t kAttributeMaxBytes = 16U << 10;
 constexpr size_t kAttributesMax = 64;
 constexpr size_t kReferenceMaxBytes = 16;
 
@@ -384,10 +384,10 @@ void XmlTokenizer::ReadValue(char quote, std::string& value) {
     if (rest[0] == '&') {
       std::string character;
       length = std::max<size_t>(Resolve(character), 1);
-      if (value.size() < kValueMaxBytes) value += character;
+      if (value.size() < kAttributeMaxBytes) value += character;
     } else {
       length = FindEither(rest, quote, '&');
-      value.append(rest.substr(0, std::min(length, kValueMaxBytes - std::min(kValueMaxBytes, value.size()))));
+      value.append(rest.substr(0, std::min(length, kAttributeMaxBytes - std::min(kAttributeMaxBytes, value.size()))));
     }
     begin_ += length;
   }

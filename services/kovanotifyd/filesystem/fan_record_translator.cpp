@@ -8,12 +8,12 @@ namespace ferrox::notifyd {
 
 namespace {
 
-using Kind = Change::Kind;
+using ChangeKind = Change::Kind;
 
 /// Changes in a file, rather than of its names.
 constexpr uint64_t kFileMask = FAN_MODIFY | FAN_CLOSE_WRITE | FAN_ATTRIB;
 
-void Report(WatchListener& listener, Kind kind, const FanRecord& record, const std::string& path,
+void Report(WatchListener& listener, ChangeKind kind, const FanRecord& record, const std::string& path,
             const std::string& old_path = {}) {
   listener.OnChange({kind, record.IsFolder(), path, old_path});
 }
@@ -59,13 +59,13 @@ void FanRecordTranslator::TranslateName(const FanRecord& record, WatchListener& 
 
   if ((mask & FAN_DELETE) != 0 && ReportDeleted(record, listener)) return;
   for (const std::string& path : paths_) {
-    if ((mask & (FAN_CREATE | FAN_DELETE)) != 0) Report(listener, Kind::kCreated, record, path);
+    if ((mask & (FAN_CREATE | FAN_DELETE)) != 0) Report(listener, ChangeKind::kCreated, record, path);
     if ((mask & FAN_CLOSE_WRITE) != 0) {
-      Report(listener, Kind::kWritten, record, path);
+      Report(listener, ChangeKind::kWritten, record, path);
     } else if ((mask & FAN_MODIFY) != 0) {
-      Report(listener, Kind::kModified, record, path);
+      Report(listener, ChangeKind::kModified, record, path);
     }
-    if ((mask & FAN_ATTRIB) != 0) Report(listener, Kind::kAttributes, record, path);
+    if ((mask & FAN_ATTRIB) != 0) Report(listener, ChangeKind::kAttributes, record, path);
   }
 }
 
@@ -77,7 +77,7 @@ void FanRecordTranslator::NoteNewFolder(const FanRecord& record) {
 
 /// @return false when the name is there again, and what the record says beside the deletion counts too.
 bool FanRecordTranslator::ReportDeleted(const FanRecord& record, WatchListener& listener) {
-  for (const std::string& path : paths_) Report(listener, Kind::kDeleted, record, path);
+  for (const std::string& path : paths_) Report(listener, ChangeKind::kDeleted, record, path);
   const bool may_be_back = (record.mask & FAN_CREATE) != 0 || parts_.history.HasLeft(record.target);
   parts_.history.Note(record);
   if (!may_be_back || record.IsFolder()) return true;
@@ -90,7 +90,7 @@ void FanRecordTranslator::ReportByNumber(const FanRecord& record, WatchListener&
   if (!file.has_value()) return parts_.finder.ReportUncertain(record.folder, listener);
   if (*file == 0) return;
   for (const std::string& root : parts_.roots.PathsOn(record.target)) {
-    listener.OnChange({Kind::kByNumber, false, root, {}, *file});
+    listener.OnChange({ChangeKind::kByNumber, false, root, {}, *file});
   }
 }
 
@@ -111,17 +111,17 @@ void FanRecordTranslator::TranslateRename(const FanRecord& record, WatchListener
   // A link that was made at the old name afterwards may have been joined with an earlier record of it.
   if (record.IsFolder() || paths_.empty() || !parts_.history.MayHaveName(record.target)) return;
   if (!parts_.mounts.HasName(record.folder, record.name).value_or(false)) return;
-  for (const std::string& path : paths_) Report(listener, Kind::kCreated, record, path);
+  for (const std::string& path : paths_) Report(listener, ChangeKind::kCreated, record, path);
 }
 
 void FanRecordTranslator::ReportRename(const FanRecord& record, WatchListener& listener) {
   for (size_t i = 0; i < std::max(paths_.size(), new_paths_.size()); ++i) {
     if (i >= paths_.size()) {
-      Report(listener, Kind::kCreated, record, new_paths_[i]);
+      Report(listener, ChangeKind::kCreated, record, new_paths_[i]);
     } else if (i >= new_paths_.size()) {
-      Report(listener, Kind::kDeleted, record, paths_[i]);
+      Report(listener, ChangeKind::kDeleted, record, paths_[i]);
     } else {
-      Report(listener, Kind::kRenamed, record, new_paths_[i], paths_[i]);
+      Report(listener, ChangeKind::kRenamed, record, new_paths_[i], paths_[i]);
     }
   }
 }

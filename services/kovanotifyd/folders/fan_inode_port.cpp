@@ -13,7 +13,7 @@ namespace {
 
 using Kind = FolderRecord::Kind;
 
-constexpr const char* kLimitFile = "/proc/sys/fs/fanotify/max_user_marks";
+constexpr const char* kMarkLimitFile = "/proc/sys/fs/fanotify/max_user_marks";
 constexpr auto kScope = FanGroup::Scope::kFolder;
 constexpr uint64_t kPlaceMask = FAN_MOVE_SELF | FAN_DELETE_SELF | FAN_ONDIR;
 constexpr uint64_t kAllMask =
@@ -63,7 +63,7 @@ void AddRecords(const FanRecord& record, uint64_t file, std::vector<FolderRecord
 
 FolderPort::Limit FanInodePort::WatchLimit() const {
   Limit limit{0, "fs.fanotify.max_user_marks"};
-  std::ifstream(kLimitFile) >> limit.watches;
+  std::ifstream(kMarkLimitFile) >> limit.watches;
   return limit;
 }
 

@@ -12,17 +12,11 @@
 
 namespace ferrox::notifyd {
 
-namespace {
-
-constexpr FolderTree::Id kNone = FolderTree::kNone;
-
-}  // namespace
-
 void FolderInspector::InspectNext(WatchListener& listener) {
   const std::optional<InspectionQueue::Folder> next = queue_.TakeFolder();
   if (!next.has_value()) return InspectName(queue_.TakeName(), listener);
   const Id id = tree_.Get(next->folder);
-  if (id != kNone && tree_.IsCovered(id)) InspectAndReport(id, next->relist, listener);
+  if (id != kNoFolder && tree_.IsCovered(id)) InspectAndReport(id, next->relist, listener);
 }
 
 void FolderInspector::ContinueWalk(WatchListener& listener) {
@@ -30,12 +24,12 @@ void FolderInspector::ContinueWalk(WatchListener& listener) {
   if (const std::optional<Ref> next = queue_.Walks().TakeFolder(); next.has_value()) {
     const Id id = tree_.Get(*next);
     std::vector<Ref> below;
-    if (id != kNone && tree_.IsCovered(id)) (void)Inspect(id, true, below, listener);
+    if (id != kNoFolder && tree_.IsCovered(id)) (void)Inspect(id, true, below, listener);
     return queue_.Walks().AddFolders(root, below);  // the root may have been refused meanwhile
   }
   queue_.Walks().End();
   const Id id = roots_.FolderOf(root);
-  if (id == kNone || tree_.Key(id) == 0) return roots_.Refuse(root, "it was moved or removed", listener);
+  if (id == kNoFolder || tree_.Key(id) == 0) return roots_.Refuse(root, "it was moved or removed", listener);
   listener.OnCovered(root);
 }
 
@@ -89,7 +83,7 @@ FolderInspector::Finding FolderInspector::Watch(Id id, int folder, WatchListener
 /// be told apart then, so the roots over `id` are refused.
 bool FolderInspector::TakeOverKey(Id id, int folder, FolderKey key, WatchListener& listener) {
   const Id other = tree_.ByKey(key);
-  if (other == kNone) return true;
+  if (other == kNoFolder) return true;
   const std::string other_path = tree_.Path(other);
   if (IsAt(other_path, folder) && IsAt(tree_.Path(id), folder)) {
     for (const std::string& root : roots_.PathsOver(id)) {
@@ -114,7 +108,7 @@ FolderInspector::Finding FolderInspector::OnFailure(Id id, int error, WatchListe
   }
   const Ref ref = tree_.RefOf(id);
   if (tree_.Has(id, FolderTree::kRoot)) roots_.Refuse(tree_.Path(id), strerror(error), listener);
-  if (tree_.Get(ref) == kNone || !tree_.IsCovered(id)) return Finding::kRefused;
+  if (tree_.Get(ref) == kNoFolder || !tree_.IsCovered(id)) return Finding::kRefused;
   if (gone) {
     RemoveGone(id, listener);
     return Finding::kGone;
@@ -146,13 +140,13 @@ void FolderInspector::List(Id id, base::UniqueFd folder, std::vector<Ref>& below
     Id child = tree_.Child(id, name);
     const bool is_wanted = filter.Wants(name);
     if (is_wanted) {
-      if (child == kNone) child = tree_.Add(id, name);
+      if (child == kNoFolder) child = tree_.Add(id, name);
       below.push_back(tree_.RefOf(child));
     }
-    if (child != kNone) tree_.Set(child, FolderTree::kListed, is_wanted || tree_.Has(child, FolderTree::kPassage));
+    if (child != kNoFolder) tree_.Set(child, FolderTree::kListed, is_wanted || tree_.Has(child, FolderTree::kPassage));
   });
   for (const Ref child : tree_.Children(id)) {
-    if (tree_.Get(child) == kNone) continue;
+    if (tree_.Get(child) == kNoFolder) continue;
     const bool stays = tree_.Has(child.id, FolderTree::kListed) || tree_.Has(child.id, FolderTree::kRoot);
     tree_.Set(child.id, FolderTree::kListed, false);
     if (is_complete && !stays) roots_.RemoveFolder(child.id, listener);
@@ -162,9 +156,9 @@ void FolderInspector::List(Id id, base::UniqueFd folder, std::vector<Ref>& below
 /// A name that is no folder on disk may yet be right in the tree of a later record: it waits until all are read.
 void FolderInspector::InspectName(const InspectionQueue::Name& name, WatchListener& listener) {
   const Id parent = tree_.Get(name.parent);
-  if (parent == kNone || !tree_.IsCovered(parent) || !roots_.FilterIn(parent).Wants(name.name)) return;
+  if (parent == kNoFolder || !tree_.IsCovered(parent) || !roots_.FilterIn(parent).Wants(name.name)) return;
   Id child = tree_.Child(parent, name.name);
-  if (child == kNone) {
+  if (child == kNoFolder) {
     struct stat status = {};
     if (lstat(tree_.Path(parent, name.name).c_str(), &status) < 0 || !S_ISDIR(status.st_mode)) {
       if (!watches_.IsAllRead()) queue_.AddNameInDoubt(parent, name.name);
@@ -176,10 +170,10 @@ void FolderInspector::InspectName(const InspectionQueue::Name& name, WatchListen
 }
 
 void FolderInspector::RetryUnreadable(Id folder) {
-  if (folder == kNone) return;
+  if (folder == kNoFolder) return;
   std::erase_if(unreadable_, [this](Ref ref) {
     const Id id = tree_.Get(ref);
-    return id == kNone || !tree_.Has(id, FolderTree::kUnreadable);
+    return id == kNoFolder || !tree_.Has(id, FolderTree::kUnreadable);
   });
   for (const Ref ref : unreadable_) {
     if (folder == FolderTree::kTop || folder == ref.id || tree_.Parent(ref.id) == folder) queue_.AddFolder(ref, false);

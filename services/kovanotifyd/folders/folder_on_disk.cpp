@@ -8,15 +8,12 @@
 #include <unistd.h>
 
 #include <cerrno>
-#include <memory>
+
+#include "base/files.h"
 
 namespace ferrox::notifyd {
 
 namespace {
-
-struct DirClose {
-  void operator()(DIR* dir) const { (void)closedir(dir); }
-};
 
 /// Some file systems do not tell the type of an entry in the listing.
 bool IsFolder(const dirent& entry, int parent) {
@@ -54,7 +51,7 @@ bool IsAt(const std::string& path, int folder) {
 }
 
 bool ListFolders(base::UniqueFd folder, const std::function<void(std::string_view name)>& visit) {
-  const std::unique_ptr<DIR, DirClose> dir(fdopendir(folder.Get()));
+  const base::OpenFolderPtr dir(fdopendir(folder.Get()));
   if (dir == nullptr) return false;
   const int fd = folder.Release();
   errno = 0;

@@ -8,8 +8,6 @@ namespace {
 
 using Kind = FolderRecord::Kind;
 
-constexpr FolderTree::Id kNone = FolderTree::kNone;
-
 }  // namespace
 
 void FolderRecordTranslator::Translate(const FolderRecord& record, WatchListener& listener) {
@@ -21,7 +19,7 @@ void FolderRecordTranslator::Translate(const FolderRecord& record, WatchListener
   if (record.kind == Kind::kSelfMoved || record.kind == Kind::kSelfGone) return OnFolderItself(record, listener);
   if (IsCookie(record)) OnCookieTouched(listener);
   const Id parent = CoveredFolder(record.folder);
-  if (parent != kNone) return OnRecordIn(parent, record, listener);
+  if (parent != kNoFolder) return OnRecordIn(parent, record, listener);
   if (record.kind == Kind::kAttributes && record.name.empty()) inspector_.RetryUnreadable(FolderTree::kTop);
 }
 
@@ -35,10 +33,10 @@ void FolderRecordTranslator::OnCookieTouched(WatchListener& listener) {
   queue_.HasDoubts() ? queue_.DeferCookie() : listener.OnCookie();
 }
 
-/// kNone for the key of no folder of the tree, and for that of a passage, of which only its own moves matter.
+/// kNoFolder for the key of no folder of the tree, and for that of a passage, of which only its own moves matter.
 FolderTree::Id FolderRecordTranslator::CoveredFolder(FolderKey key) const {
   const Id id = tree_.ByKey(key);
-  return id != kNone && tree_.IsCovered(id) ? id : kNone;
+  return id != kNoFolder && tree_.IsCovered(id) ? id : kNoFolder;
 }
 
 void FolderRecordTranslator::OnRecordIn(Id parent, const FolderRecord& record, WatchListener& listener) {
@@ -57,8 +55,8 @@ void FolderRecordTranslator::OnRecordIn(Id parent, const FolderRecord& record, W
       inspector_.RetryUnreadable(record.name.empty() ? parent : tree_.Child(parent, record.name));
       return listener.OnChange({Change::Kind::kAttributes, true, path});
     case Kind::kDeleted: {
-      const Id child = is_folder ? tree_.Child(parent, record.name) : kNone;
-      if (child != kNone) roots_.RemoveFolder(child, listener);
+      const Id child = is_folder ? tree_.Child(parent, record.name) : kNoFolder;
+      if (child != kNoFolder) roots_.RemoveFolder(child, listener);
       return listener.OnChange({Change::Kind::kDeleted, is_folder, path});
     }
     case Kind::kUncertain:
@@ -91,11 +89,12 @@ void FolderRecordTranslator::OnFolderCreated(Id parent, std::string_view name, W
     return listener.OnChange({Change::Kind::kCreated, true, tree_.Path(parent, name)});
   }
   Id child = tree_.Child(parent, name);
-  if (child != kNone && tree_.Key(child) != 0) {  // found by a listing before its record was read, or another by now
+  if (child != kNoFolder &&
+      tree_.Key(child) != 0) {  // found by a listing before its record was read, or another by now
     queue_.AddNameInDoubt(parent, name);
     return listener.OnChange({Change::Kind::kCreated, true, tree_.Path(child)});
   }
-  if (child == kNone) child = tree_.Add(parent, name);
+  if (child == kNoFolder) child = tree_.Add(parent, name);
   inspector_.InspectAndReport(child, false, listener);
 }
 
@@ -113,13 +112,13 @@ void FolderRecordTranslator::OnUncertain(Id parent, const FolderRecord& record, 
 void FolderRecordTranslator::OnRenamed(const FolderRecord& record, WatchListener& listener) {
   const Id old_parent = CoveredFolder(record.old_folder);
   const Id parent = CoveredFolder(record.folder);
-  if (old_parent != kNone && parent != kNone) {
+  if (old_parent != kNoFolder && parent != kNoFolder) {
     listener.OnChange({Change::Kind::kRenamed, record.is_folder, tree_.Path(parent, record.name),
                        tree_.Path(old_parent, record.old_name)});
     if (record.is_folder) MoveFolder(old_parent, parent, record, listener);
-  } else if (old_parent != kNone) {
+  } else if (old_parent != kNoFolder) {
     OnMovedAway(old_parent, record, listener);
-  } else if (parent != kNone) {
+  } else if (parent != kNoFolder) {
     OnRecordIn(parent, {Kind::kCreated, record.is_folder, record.folder, record.name, 0, {}}, listener);
   }
 }
@@ -132,7 +131,7 @@ void FolderRecordTranslator::OnMovedAway(Id parent, const FolderRecord& record, 
   struct stat status = {};
   const bool there = lstat(path.c_str(), &status) == 0;
   if (there) queue_.AddNameInDoubt(parent, record.old_name);
-  if (record.is_folder && child != kNone) roots_.RemoveFolder(child, listener);
+  if (record.is_folder && child != kNoFolder) roots_.RemoveFolder(child, listener);
   if (there) return listener.OnChange({Change::Kind::kUncertain, S_ISDIR(status.st_mode), path});
   listener.OnChange({Change::Kind::kDeleted, record.is_folder, path});
 }
@@ -145,19 +144,19 @@ void FolderRecordTranslator::MoveFolder(Id old_parent, Id parent, const FolderRe
   queue_.AddNameInDoubt(parent, record.name);
   const Id folder = tree_.Child(old_parent, record.old_name);
   const Id replaced = tree_.Child(parent, record.name);
-  if (folder == kNone) {  // a listing has found it in its new place already, or never
-    if (replaced == kNone) OnFolderCreated(parent, record.name, listener);
+  if (folder == kNoFolder) {  // a listing has found it in its new place already, or never
+    if (replaced == kNoFolder) OnFolderCreated(parent, record.name, listener);
     return;
   }
   if (folder == replaced) return;
   const FolderTree::Ref moved = tree_.RefOf(folder);
   const bool same_names = roots_.FilterIn(old_parent) == roots_.FilterIn(parent);
-  if (replaced != kNone) roots_.RemoveFolder(replaced, listener);
-  const bool can_move = tree_.Get(moved) != kNone && tree_.Get(target) != kNone &&
-                        tree_.Child(parent, record.name) == kNone && !tree_.IsWithin(parent, folder);
+  if (replaced != kNoFolder) roots_.RemoveFolder(replaced, listener);
+  const bool can_move = tree_.Get(moved) != kNoFolder && tree_.Get(target) != kNoFolder &&
+                        tree_.Child(parent, record.name) == kNoFolder && !tree_.IsWithin(parent, folder);
   if (!can_move || !same_names || !roots_.FilterIn(parent).Wants(record.name)) {
-    if (tree_.Get(moved) != kNone) roots_.RemoveFolder(folder, listener);
-    if (tree_.Get(target) != kNone) OnFolderCreated(parent, record.name, listener);
+    if (tree_.Get(moved) != kNoFolder) roots_.RemoveFolder(folder, listener);
+    if (tree_.Get(target) != kNoFolder) OnFolderCreated(parent, record.name, listener);
     return;
   }
   roots_.MoveFolder(folder, parent, record.name, listener);
@@ -167,7 +166,7 @@ void FolderRecordTranslator::MoveFolder(Id old_parent, Id parent, const FolderRe
 /// Where a parent is covered, its own record of the name says the same and more.
 void FolderRecordTranslator::OnFolderItself(const FolderRecord& record, WatchListener& listener) {
   const Id id = tree_.ByKey(record.folder);
-  if (id == kNone) return;
+  if (id == kNoFolder) return;
   if (record.kind == Kind::kSelfGone) tree_.SetKey(id, 0);
   const bool is_parent_covered = id != FolderTree::kTop && tree_.IsCovered(tree_.Parent(id));
   const bool is_root_gone = record.kind == Kind::kSelfGone && tree_.Has(id, FolderTree::kRoot);

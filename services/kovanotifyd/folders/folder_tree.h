@@ -150,4 +150,6 @@ class FolderTree {
   IdTable by_key_;    ///< those with a key
 };
 
+constexpr FolderTree::Id kNoFolder = FolderTree::kNone;
+
 }  // namespace ferrox::notifyd

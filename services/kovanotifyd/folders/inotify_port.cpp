@@ -22,9 +22,9 @@ constexpr size_t kBatchBytes = 256 * 1024;
 constexpr size_t kBatches = 4;
 /// How long to wait for that second half. There may be none: the folder was moved out of what is watched.
 constexpr int kMoveWaitMs = 10;
-constexpr const char* kLimitFile = "/proc/sys/fs/inotify/max_user_watches";
+constexpr const char* kWatchLimitFile = "/proc/sys/fs/inotify/max_user_watches";
 
-uint32_t MaskOf(FolderPort::Wanted wanted) {
+uint32_t InotifyMask(FolderPort::Wanted wanted) {
   constexpr uint32_t kPlace = IN_MOVE_SELF | IN_DELETE_SELF;
   constexpr uint32_t kNames = IN_CREATE | IN_DELETE | IN_MOVED_FROM | IN_MOVED_TO;
   constexpr uint32_t kContent = IN_MODIFY | IN_CLOSE_WRITE | IN_ATTRIB | IN_EXCL_UNLINK;
@@ -119,14 +119,14 @@ std::string InotifyPort::Open() {
 
 FolderPort::Limit InotifyPort::WatchLimit() const {
   Limit limit{0, "fs.inotify.max_user_watches"};
-  std::ifstream(kLimitFile) >> limit.watches;
+  std::ifstream(kWatchLimitFile) >> limit.watches;
   return limit;
 }
 
 int InotifyPort::Watch(int folder, Wanted wanted, FolderKey& key) {
   // Through the descriptor, so that it is this folder that is watched, whatever lies at its path by now.
   const std::string path = "/proc/self/fd/" + std::to_string(folder);
-  const int watch = inotify_add_watch(inotify_.Get(), path.c_str(), MaskOf(wanted) | IN_ONLYDIR | IN_MASK_ADD);
+  const int watch = inotify_add_watch(inotify_.Get(), path.c_str(), InotifyMask(wanted) | IN_ONLYDIR | IN_MASK_ADD);
   if (watch < 0) return errno;
   key = static_cast<FolderKey>(watch);
   return 0;

@@ -11,8 +11,6 @@ namespace ferrox::notifyd {
 
 namespace {
 
-constexpr FolderTree::Id kNone = FolderTree::kNone;
-
 bool Contains(const std::vector<std::string>& names, std::string_view name) {
   return std::find(names.begin(), names.end(), name) != names.end();
 }
@@ -31,11 +29,11 @@ bool NameFilter::operator==(const NameFilter& other) const {
 void RootPassages::Mark(const std::vector<FolderTree::Ref>& roots) {
   for (const FolderTree::Ref ref : std::exchange(marked_, {})) {
     const FolderTree::Id id = tree_.Get(ref);
-    if (id != kNone) tree_.Set(id, FolderTree::kPassage, false);
+    if (id != kNoFolder) tree_.Set(id, FolderTree::kPassage, false);
   }
   for (const FolderTree::Ref root : roots) {
     FolderTree::Id at = tree_.Get(root);
-    while (at != kNone && at != FolderTree::kTop) {
+    while (at != kNoFolder && at != FolderTree::kTop) {
       at = tree_.Parent(at);
       if (tree_.Has(at, FolderTree::kPassage)) break;
       tree_.Set(at, FolderTree::kPassage, true);
@@ -51,7 +49,7 @@ void RootPassages::Watch(FolderTree::Id root) {
     const base::UniqueFd folder(open(tree_.Path(at).c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
     FolderKey key = 0;
     if (!folder.Valid() || watches_.Watch(folder.Get(), FolderPort::Wanted::kPlace, key) != 0) continue;
-    if (tree_.ByKey(key) != kNone) continue;
+    if (tree_.ByKey(key) != kNoFolder) continue;
     watches_.Drop(at);
     tree_.SetKey(at, key);
   }
@@ -74,7 +72,7 @@ void RootLedger::Remove(const std::string& root) {
   const std::vector<std::string> ignore = std::move(found->second.ignore);
   roots_.erase(found);
   queue_.Walks().Cancel(root);
-  if (id == kNone) return;
+  if (id == kNoFolder) return;
   tree_.Set(id, FolderTree::kRoot, false);
   MarkPassages();
   if (!tree_.IsCovered(id)) return Prune(id);
@@ -112,7 +110,7 @@ std::vector<std::string> RootLedger::PathsWithin(Id id) const {
   if (!tree_.LeadsToRoot(id)) return paths;
   for (const auto& [path, root] : roots_) {
     const Id folder = tree_.Get(root.folder);
-    if (folder != kNone && tree_.IsWithin(folder, id)) paths.push_back(path);
+    if (folder != kNoFolder && tree_.IsWithin(folder, id)) paths.push_back(path);
   }
   return paths;
 }
@@ -199,13 +197,13 @@ void RootLedger::Prune(Id id) {
       const Id parent = tree_.Parent(id);
       watches_.RemoveFromTree(id);
       const bool needed = tree_.IsCovered(parent) || tree_.Has(parent, FolderTree::kPassage);
-      if (needed || tree_.FirstChild(parent) != kNone) return;
+      if (needed || tree_.FirstChild(parent) != kNoFolder) return;
       id = parent;
     }
     return watches_.Drop(id);
   }
   watches_.Drop(id);
-  for (Id child = tree_.FirstChild(id), next = kNone; child != kNone; child = next) {
+  for (Id child = tree_.FirstChild(id), next = kNoFolder; child != kNoFolder; child = next) {
     next = tree_.NextSibling(child);
     Prune(child);
   }
