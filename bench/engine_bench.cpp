@@ -20,7 +20,7 @@
 #include <json/value.h>
 
 #include "common/json_util.h"
-#include "services/kovaelasticd/engine.h"
+#include "services/kovaelasticd/commands/engine.h"
 
 namespace {
 

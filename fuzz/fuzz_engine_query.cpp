@@ -3,9 +3,9 @@
 #include <string>
 
 #include "common/error.h"
-#include "services/kovaelasticd/query.h"
-#include "services/kovaelasticd/snippet.h"
-#include "services/kovaelasticd/words.h"
+#include "services/kovaelasticd/query/query.h"
+#include "services/kovaelasticd/text/snippet.h"
+#include "services/kovaelasticd/text/words.h"
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   using namespace ferrox::engine;

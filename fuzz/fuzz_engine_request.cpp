@@ -7,7 +7,7 @@
 
 #include "common/json_util.h"
 #include "fuzz/memory_folder.h"
-#include "services/kovaelasticd/engine.h"
+#include "services/kovaelasticd/commands/engine.h"
 
 namespace {
 

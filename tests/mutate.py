@@ -11,7 +11,7 @@ compile is no mutant. Results are kept by line in FILE: those that are in it are
 also after an interrupt; use a worktree in which nothing else is built meanwhile.
 
 tests/mutate.py --target words_test engine_test --run 'build/release/bin/words_test' --run 'build/release/bin/engine_test'
-    --sample 30 services/kovaelasticd/words.cpp
+    --sample 30 services/kovaelasticd/text/words.cpp
 """
 import argparse
 import json

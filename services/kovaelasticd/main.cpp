@@ -8,7 +8,7 @@
 #include "base/files.h"
 #include "common/error.h"
 #include "common/paths.h"
-#include "services/kovaelasticd/engine.h"
+#include "services/kovaelasticd/commands/engine.h"
 #include "services/support/daemon.h"
 #include "services/support/frame_server.h"
 

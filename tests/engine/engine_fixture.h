@@ -7,7 +7,7 @@
 #include <gtest/gtest.h>
 
 #include "common/json_util.h"
-#include "services/kovaelasticd/engine.h"
+#include "services/kovaelasticd/commands/engine.h"
 #include "tests/support/temp_dir.h"
 
 namespace ferrox::engine {

@@ -1,5 +1,5 @@
 // Catches requests that the engine answers with the wrong code, and changes and pages of hits that get lost.
-#include "services/kovaelasticd/engine.h"
+#include "services/kovaelasticd/commands/engine.h"
 
 #include <sys/stat.h>
 #include <unistd.h>

@@ -1,5 +1,5 @@
 // Catches searches that wait for writers, and committed changes lost beside failures, full disks and threads.
-#include "services/kovaelasticd/index.h"
+#include "services/kovaelasticd/indices/index.h"
 
 #include <filesystem>
 #include <functional>

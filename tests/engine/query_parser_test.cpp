@@ -7,7 +7,7 @@
 #include <gtest/gtest.h>
 
 #include "common/error.h"
-#include "services/kovaelasticd/query.h"
+#include "services/kovaelasticd/query/query.h"
 
 namespace ferrox::engine {
 namespace {

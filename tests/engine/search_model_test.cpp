@@ -5,7 +5,7 @@
 
 #include <gtest/gtest.h>
 
-#include "services/kovaelasticd/words.h"
+#include "services/kovaelasticd/text/words.h"
 #include "tests/engine/store_helpers.h"
 #include "tests/support/temp_dir.h"
 

@@ -1,5 +1,5 @@
 // Catches marks in the wrong place, and bytes of a text that reach a terminal through its snippet.
-#include "services/kovaelasticd/snippet.h"
+#include "services/kovaelasticd/text/snippet.h"
 
 #include <string>
 

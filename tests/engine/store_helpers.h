@@ -7,8 +7,8 @@
 
 #include <json/value.h>
 
-#include "services/kovaelasticd/query.h"
-#include "services/kovaelasticd/sqlite_store.h"
+#include "services/kovaelasticd/query/query.h"
+#include "services/kovaelasticd/store/sqlite_store.h"
 
 namespace ferrox::engine {
 

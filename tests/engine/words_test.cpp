@@ -1,5 +1,5 @@
 // Catches words that are cut or folded unlike in the indices that exist already.
-#include "services/kovaelasticd/words.h"
+#include "services/kovaelasticd/text/words.h"
 
 #include <string>
 
@@ -51,7 +51,8 @@ TEST(WordsTest, TextIsCutAndFolded) {
 }
 
 // Indices are cut by these foldings, so they are the same in every release: FNV-1a over each code point's class and
-// folded form. See services/kovaelasticd/make_fold_tables.py for what to do when a newer Unicode folds differently.
+// folded form. See services/kovaelasticd/text/make_fold_tables.py for what to do when a newer Unicode folds
+// differently.
 TEST(WordsTest, EveryCharacterFoldsAsInEarlierReleases) {
   uint64_t hash = 0xCBF29CE484222325;
   const auto add = [&](unsigned char byte) { hash = (hash ^ byte) * 0x100000001B3; };

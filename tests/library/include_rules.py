@@ -29,6 +29,10 @@ MAY = {
 }
 DAEMONS = ("fileindexd", "kovacontentextractd", "kovaelasticd", "kovanotifyd", "supervisor")
 MAY |= {f"services/{name}": LIBRARY + ["services/support"] for name in DAEMONS}
+# The engine's rooms, each of which may include those before it.
+ENGINE = [f"services/kovaelasticd/{name}" for name in ("text", "query", "store", "search", "indices", "commands")]
+MAY |= {room: MAY["services/kovaelasticd"] + ENGINE[:at] for at, room in enumerate(ENGINE)}
+MAY["services/kovaelasticd"] = MAY["services/kovaelasticd"] + ENGINE[-1:]
 # The installed paths of headers that lie in a room, here and in the programs that use the library.
 FORWARDING = {f"fileindex/{name}.h" for name in ("folder", "folder_mgr", "index_mgr", "optree", "queue_mgr", "watch_list")}
 FORWARDING |= {"common/unique_fd.h", "common/scope_exit.h", "platform/include/kova/text.h", "fileindex/elastic/fields.h"}
@@ -36,6 +40,8 @@ FORWARDING |= {"common/unique_fd.h", "common/scope_exit.h", "platform/include/ko
 EXCEPTIONS = {
     # A queue is read into a tree, and one that is searched keeps the folders loaded.
     "fileindex/queue/queue_mgr.cpp": ["fileindex/optree/optree.h", "fileindex/folders/folder_mgr.h"],
+    # A store is what answers searches; the search in it is made of parts of the store.
+    "services/kovaelasticd/store/sqlite_store.cpp": ["services/kovaelasticd/search/sqlite_search.h"],
     # The daemons' main functions know the host that they run on: its table of shares, its registry, its services.
     "services/fileindexd/main.cpp": ["platform/host/share_table.h", "platform/host/mounts.h"],
     "services/kovanotifyd/main.cpp": ["platform/host/configuration.h", "platform/host/notify_registry.h"],

@@ -1,0 +1,68 @@
+#pragma once
+
+#include <optional>
+#include <string>
+
+#include <json/value.h>
+
+#include "services/kovaelasticd/indices/registry.h"
+
+namespace ferrox::engine {
+
+/// The commands of docs/formats/engine.md: a table of names and functions. Each function reads its members with the
+/// helpers below, which refuse what is missing or of another type by naming it, and does its work through the registry.
+
+/// One command of a request.
+struct CommandCall {
+  Registry& registry;
+  Json::Value& data;  ///< the request's "data", an object; the command may move values out of it
+};
+
+/// What a command does; returns the reply's "data", null for none. Everything is checked before anything is changed.
+/// @throws Error with the reply's code and sentence.
+using CommandFunction = Json::Value (*)(CommandCall& call);
+
+struct Command {
+  const char* name;
+  CommandFunction run;
+  bool for_all;  ///< every user may use it; else root and the engine's own user
+};
+/// A command by its name; null when there is none.
+const Command* FindCommand(const std::string& name);
+
+/// One change of a document, checked.
+struct DocumentChange {
+  enum class Type { kUpsert, kSet, kDelete, kDeletePrefix };
+  Type type;
+  std::string path;
+  const Json::Value* data = nullptr;  ///< into the request
+};
+
+/// Whether the command changes a document; such commands of one compound are carried out together.
+bool IsDocumentChange(const std::string& command);
+/// Checks a change against the index's schema. What it returns points into `data`.
+/// @throws Error kEngineBadRequest.
+DocumentChange ReadDocumentChange(const std::string& command, const Registry::OpenIndex& index, Json::Value& data);
+/// Carries out a change, on the index's thread. @throws what the store's member throws.
+void Apply(IndexStore& store, const DocumentChange& change);
+
+/// The product's version, from the build.
+inline constexpr char kVersion[] = FERROX_VERSION;
+
+// Reading of members, common to all commands. Null and a missing member are the same, and stand for `otherwise`.
+// @throws Error kEngineBadRequest naming the member and what it must be.
+std::string RequiredText(const Json::Value& data, const char* name);
+std::optional<std::string> OptionalText(const Json::Value& data, const char* name);
+const Json::Value& RequiredObject(const Json::Value& data, const char* name);
+int64_t OptionalInt(const Json::Value& data, const char* name, int64_t otherwise, int64_t low, int64_t high);
+bool OptionalBool(const Json::Value& data, const char* name, bool otherwise);
+
+/// The command "search" (search_command.cpp).
+Json::Value RunSearch(CommandCall& call);
+
+/// {"success":false,"error":{"code":...,"msg":...}}
+Json::Value FailureReply(int code, const std::string& sentence);
+/// {"success":true,"data":...}; without "data" when it is null.
+Json::Value SuccessReply(Json::Value data);
+
+}  // namespace ferrox::engine

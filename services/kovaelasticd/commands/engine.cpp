@@ -1,0 +1,196 @@
+#include "services/kovaelasticd/commands/engine.h"
+
+#include <unistd.h>
+
+#include <optional>
+#include <vector>
+
+#include "common/json_scan.h"
+#include "common/json_util.h"
+#include "common/log.h"
+
+namespace ferrox::engine {
+
+namespace {
+
+/// How many members a request may have at its top; "command", "data" and "compound" are read.
+constexpr size_t kMembersMax = 64;
+/// Of a compound. Once it is that long, further results are replaced by an error.
+constexpr size_t kReplyMaxBytes = 256U << 20;
+/// Of an unknown command's name, what the error repeats.
+constexpr size_t kNameShownBytes = 100;
+
+int ReplyCode(const Error& error) {
+  // A fault in reading the request that no command named itself.
+  return error.Code() == Error::kBadArgument ? Error::kEngineBadRequest : error.Code();
+}
+
+/// The command that a part names. @throws Error for a part of another shape and for an unknown command.
+const Command& KnownCommand(const Json::Value& part) {
+  const bool shaped = part.isObject() && part["command"].isString() && IsJsonObject(part["data"]);
+  if (!shaped) throw Error(Error::kEngineBadRequest, kShapeText);
+  const Command* command = FindCommand(part["command"].asString());
+  if (command == nullptr) {
+    throw Error(Error::kEngineUnknownCommand, "there is no command \"" +
+                                                  part["command"].asString().substr(0, kNameShownBytes) +
+                                                  "\"; see the list in docs/formats/engine.md");
+  }
+  return *command;
+}
+
+/// @throws Error kEngineNotPermitted. The peer's user is the one that the kernel gives for the socket.
+void RequireRights(const Command& command, const services::Peer& peer) {
+  if (command.for_all || peer.uid == 0 || peer.uid == geteuid()) return;
+  throw Error(Error::kEngineNotPermitted, "user " + std::to_string(peer.uid) + " may not use \"" + command.name +
+                                              "\"; only root and the engine's own user may");
+}
+
+/// A part's "data", an empty object where it has none.
+Json::Value& DataOf(Json::Value& part) {
+  Json::Value& data = part["data"];
+  if (data.isNull()) data = Json::Value(Json::objectValue);
+  return data;
+}
+
+/// Runs `run` and turns what it throws into a failure reply.
+template <typename Run>
+Json::Value ReplyOf(Run run) {
+  try {
+    return run();
+  } catch (const Error& error) {
+    return FailureReply(ReplyCode(error), error.what());
+  } catch (const Json::Exception& error) {
+    return FailureReply(Error::kEngineBadRequest, std::string("the request cannot be read: ") + error.what());
+  } catch (const std::bad_alloc&) {
+    return FailureReply(Error::kEngineBusyMemory, "the engine is short of memory; ask again later");
+  }
+}
+
+bool Failed(const Json::Value& reply) { return !reply["success"].asBool(); }
+
+}  // namespace
+
+/// The reply to a compound, as a text from the beginning: it has as many entries as the request has parts.
+class CompoundReply {
+ public:
+  void Add(const Json::Value& answer) {
+    has_fail_ = has_fail_ || Failed(answer);
+    std::string text = toString(answer);
+    if (entries_.size() + text.size() > kReplyMaxBytes && !Failed(answer) && answer.isMember("data")) {
+      text = toString(FailureReply(Error::kEngineBadRequest, "the reply is too long; ask for less at once"));
+      has_fail_ = true;
+    }
+    entries_ += (entries_.empty() ? "" : ",") + text;
+  }
+  std::string Text() const {
+    return "{\"data\":[" + entries_ + "],\"has_fail\":" + (has_fail_ ? "true" : "false") + ",\"success\":true}";
+  }
+
+ private:
+  std::string entries_;
+  bool has_fail_ = false;
+};
+
+Json::Value FailureReply(int code, const std::string& sentence) {
+  Json::Value reply;
+  reply["success"] = false;
+  reply["error"]["code"] = code;
+  reply["error"]["msg"] = sentence;
+  return reply;
+}
+
+Json::Value SuccessReply(Json::Value data) {
+  Json::Value reply;
+  reply["success"] = true;
+  if (!data.isNull()) reply["data"] = std::move(data);
+  return reply;
+}
+
+Engine::Engine(const std::string& state_folder) : registry_(state_folder) {}
+
+std::string Engine::Handle(const std::string& request, const services::Peer& peer) {
+  std::string text;
+  const Json::Value failure = ReplyOf([&] {
+    text = Answer(request, peer);
+    return Json::Value();
+  });
+  registry_.HealDamaged();
+  return failure.isNull() ? text : toString(failure);
+}
+
+/// All parts of a compound are checked for shape and rights before the first is carried out.
+std::string Engine::Answer(const std::string& request, const services::Peer& peer) {
+  const auto members = JsonMembers(request, kMembersMax);
+  if (members.has_value() && members->size() == 1 && members->front().name == "\"compound\"") {
+    CompoundParts parts(members->front().value,
+                        [&peer](const Json::Value& part) { RequireRights(KnownCommand(part), peer); });
+    return AnswerCompound(parts);
+  }
+  Json::Value parsed = ParseCommand(request);
+  if (parsed.isMember("compound")) throw Error(Error::kEngineBadRequest, kShapeText);
+  const Command& command = KnownCommand(parsed);
+  RequireRights(command, peer);
+  CommandCall call{registry_, DataOf(parsed)};
+  return toString(SuccessReply(command.run(call)));
+}
+
+/// The parts in order; neighbours that change documents of one index are carried out in one go.
+std::string Engine::AnswerCompound(CompoundParts& parts) {
+  CompoundReply reply;
+  bool suggestions_done = false;
+  while (!parts.AtEnd()) {
+    if (IsDocumentChange(parts.Front()["command"].asString())) {
+      AnswerChanges(parts, reply);
+      continue;
+    }
+    Json::Value part = parts.Take();
+    const std::string name = part["command"].asString();
+    // One rebuilding serves all the documents that are named.
+    const bool repeated = name == "update_term_suggestion" && suggestions_done;
+    const Json::Value answer = repeated ? SuccessReply(Json::Value()) : ReplyOf([&] {
+      CommandCall call{registry_, DataOf(part)};
+      return SuccessReply(FindCommand(name)->run(call));
+    });
+    suggestions_done = suggestions_done || (name == "update_term_suggestion" && !Failed(answer));
+    reply.Add(answer);
+  }
+  return reply.Text();
+}
+
+/// Carries out the next changes that are for the same index, in one turn of its thread: a compound of ten thousand
+/// documents waits for the thread once. A change that is refused does not keep the others from being made; a failure of
+/// the store ends them all.
+void Engine::AnswerChanges(CompoundParts& compound, CompoundReply& reply) {
+  const Json::Value id = compound.Front()["data"]["id"];
+  std::vector<Json::Value> parts = compound.TakeWhile([&id](const Json::Value& part) {
+    return IsDocumentChange(part["command"].asString()) && part["data"]["id"] == id;
+  });
+  std::vector<std::optional<DocumentChange>> changes(parts.size());
+  std::vector<Json::Value> failures(parts.size());
+  std::shared_ptr<Index> index;
+  for (size_t i = 0; i < parts.size(); ++i) {
+    failures[i] = ReplyOf([&] {
+      Json::Value& data = DataOf(parts[i]);
+      const Registry::OpenIndex open = registry_.Open(RequiredText(data, "id"));
+      changes[i] = ReadDocumentChange(parts[i]["command"].asString(), open, data);
+      index = open.index;
+      return Json::Value();
+    });
+  }
+  if (index != nullptr) {
+    index->Write([&](IndexStore& store) {
+      for (size_t i = 0; i < changes.size(); ++i) {
+        if (!changes[i].has_value()) continue;
+        try {
+          Apply(store, *changes[i]);
+        } catch (const Error& error) {
+          if (error.Code() == Error::kEngineStorage) throw;
+          failures[i] = FailureReply(ReplyCode(error), error.what());
+        }
+      }
+    });
+  }
+  for (const Json::Value& failure : failures) reply.Add(failure.isNull() ? SuccessReply(Json::Value()) : failure);
+}
+
+}  // namespace ferrox::engine

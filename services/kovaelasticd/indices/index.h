@@ -1,0 +1,104 @@
+#pragma once
+
+#include <atomic>
+#include <chrono>
+#include <deque>
+#include <exception>
+#include <functional>
+#include <memory>
+#include <string>
+#include <thread>
+
+#include "base/mutex.h"
+#include "services/kovaelasticd/store/index_store.h"
+
+namespace ferrox::engine {
+
+/// An open index: its store and the thread that alone changes it. Any number of threads may call any member.
+///
+/// Changes of several callers share a transaction; a commit that several wait for is made once. What nobody commits is
+/// committed after a while, or after kAutoCommitBytes. When changes that were answered with success are lost (a full
+/// disk, or a process that died: a marker file beside the index tells), the next commit fails, so that the sender
+/// of the changes sends them again.
+class Index {
+ public:
+  static constexpr std::chrono::milliseconds kAutoCommitAfter{5000};
+  static constexpr int64_t kAutoCommitBytes = 64 << 20;
+
+  /// `marker_path` is the file that exists while there are uncommitted changes. `on_damage` is called, by any thread,
+  /// when the store finds its file damaged.
+  Index(
+      std::unique_ptr<IndexStore> store, std::string marker_path,
+      std::chrono::milliseconds auto_commit_after = kAutoCommitAfter, std::function<void()> on_damage = [] {});
+  Index(const Index&) = delete;
+  Index& operator=(const Index&) = delete;
+  /// Commits and closes.
+  ~Index();
+
+  using Job = std::function<void(IndexStore&)>;
+  /// Has `job` run by the index's thread and waits for it; what it throws is thrown here. After kEngineStorage the
+  /// changes since the last commit are gone.
+  /// @throws Error kEngineIndexPaused when the index was closed meanwhile.
+  void Write(const Job& job);
+  /// The same for a job that changes nothing.
+  void Read(const Job& job);
+  /// Makes everything that was answered before durable.
+  void Commit();
+  /// Search and Stat run on the caller's thread and see the last commit.
+  SearchReply Search(const SearchRequest& request);
+  StoreStat Stat();
+  /// The number of changes that are not committed yet.
+  int64_t Uncommitted() const { return uncommitted_; }
+  /// Commits and closes the store; waits for what runs.
+  void Close();
+
+ private:
+  /// kRead and kWrite have a job; kCommit is answered once a commit after it is on the disk.
+  enum class Kind { kRead, kWrite, kCommit };
+  /// One call of Write, Read or Commit; on the stack of its caller, who waits until it is done.
+  struct Task {
+    Kind kind;
+    const Job* job;
+    std::exception_ptr failure;  ///< set by the thread before `done`
+    bool done = false;           ///< guarded by mutex_
+  };
+
+  /// Queues a task and waits until it is done.
+  void Submit(Kind kind, const Job* job);
+  void ThreadMain();
+  std::deque<Task*> WaitForTasks();
+  void Execute(Task& task);
+  void RunChange(Task& task);
+  void CommitFor(const std::deque<Task*>& waiting);
+  void CommitByItself();
+  void CommitStore();
+  void LoseChanges();
+  void Mark();
+  void Unmark();
+  template <typename Run>
+  auto ReportingDamage(Run run);
+
+  /// Held for reading by a search and a figure of the store, for writing by Close. The thread, which alone writes to
+  /// the store, uses it without: Close waits for its end first.
+  base::SharedMutex store_mutex_;
+  std::unique_ptr<IndexStore> store_;
+  const std::string marker_path_;
+  const std::chrono::milliseconds auto_commit_after_;
+  const std::function<void()> on_damage_;
+
+  base::Mutex mutex_;
+  base::ConditionVariable wake_thread_;
+  base::ConditionVariable wake_callers_;             ///< some tasks are done
+  std::deque<Task*> tasks_ BASE_GUARDED_BY(mutex_);  ///< of callers that wait, in the order of their calls
+  bool stopping_ BASE_GUARDED_BY(mutex_) = false;
+
+  // Of the thread alone, except for reading the count.
+  std::atomic<int64_t> uncommitted_{0};
+  bool marked_ = false;  ///< the marker file is there
+  bool lost_ = false;    ///< changes that were answered with success are gone, and no commit has failed for it yet
+  std::chrono::steady_clock::time_point auto_commit_at_;  ///< while uncommitted_ is above 0
+
+  std::thread thread_;
+};
+
+}  // namespace ferrox::engine

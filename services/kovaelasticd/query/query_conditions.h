@@ -1,0 +1,55 @@
+#pragma once
+
+#include <cstdint>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "services/kovaelasticd/query/query.h"
+#include "services/kovaelasticd/query/query_values.h"
+
+namespace ferrox::engine {
+
+/// A value as the query has it: a word, or a phrase without its quotes.
+struct ConditionValue {
+  std::string text;
+  bool phrase = false;  ///< it stood in quotes
+  bool prefix = false;  ///< a "*" stood behind it, which `text` is without
+  size_t begin = 0;     ///< its place in the query, in bytes
+};
+
+/// Turns single conditions of a query, a word or "field:value", into nodes: knows the names of fields, the kinds of
+/// values that each takes, and what to write instead of what it cannot read.
+class ConditionReader {
+ public:
+  /// `query` is the whole query; it must outlive this. `now`: what relative dates count from, in seconds since the
+  /// epoch.
+  ConditionReader(std::string_view query, int64_t now) : query_(query), now_(now) {}
+
+  /// Words anywhere (kText) or in the name (kName); kAll when the value has neither letter nor digit.
+  /// @throws Error kEngineBadRequest, as Field does.
+  QueryNode Words(QueryNode::Type type, const ConditionValue& value) const;
+  /// The condition "name:value", which begins at `begin`; the value is not empty.
+  QueryNode Field(const std::string& name, size_t begin, const ConditionValue& value) const;
+  /// Throws Error kEngineBadRequest: "query, character N: sentence"; N is the place of the byte `at`, counted in
+  /// characters from 1.
+  [[noreturn]] void Refuse(size_t at, const std::string& sentence) const;
+
+ private:
+  QueryNode WordsInField(const std::string& name, size_t begin, const ConditionValue& value) const;
+  std::string UserNumber(const ConditionValue& value) const;
+  std::string GroupNumber(const ConditionValue& value) const;
+  QueryNode Name(ConditionValue value) const;
+  QueryNode Kinds(const ConditionValue& value) const;
+  QueryNode Extensions(const ConditionValue& value) const;
+  QueryNode Path(const ConditionValue& value) const;
+  QueryNode Size(const ConditionValue& value) const;
+  QueryNode Date(const ConditionValue& value) const;
+  QueryNode Number(const RangeField& field, const ConditionValue& value) const;
+  std::vector<std::string> Parts(const ConditionValue& value) const;
+
+  const std::string_view query_;
+  const int64_t now_;
+};
+
+}  // namespace ferrox::engine

@@ -1,0 +1,39 @@
+#pragma once
+
+#include <cstdint>
+#include <string>
+#include <vector>
+
+#include "services/kovaelasticd/search/query_evaluator.h"
+#include "services/kovaelasticd/search/relevance.h"
+#include "services/kovaelasticd/store/doc_set.h"
+#include "services/kovaelasticd/store/index_store.h"
+#include "services/kovaelasticd/store/store_reader.h"
+#include "services/kovaelasticd/store/store_rows.h"
+
+namespace ferrox::engine {
+
+/// One search over one snapshot of an index: finds the set of documents (QueryEvaluator), orders them by relevance
+/// (RelevanceRanking) or by a column, and loads the page that is asked for. `reader` has a transaction open for as
+/// long, which is what makes it one snapshot.
+class Searcher {
+ public:
+  Searcher(StoreReader& reader, const SearchRequest& request) : reader_(reader), request_(request) {}
+  /// @throws Error kEngineStorage.
+  SearchReply Run();
+
+ private:
+  std::vector<RankedDocument> OrderByRelevance(const DocSet& documents, const Totals& totals, const FoundWords& words,
+                                               SearchReply& reply);
+  std::vector<RankedDocument> OrderByColumn(const DocSet& documents, int64_t total);
+  std::vector<RankedDocument> OrderFetched(const DocSet& documents);
+  std::vector<RankedDocument> OrderByWalk(const DocSet& documents);
+  /// How many hits, from the first, the page needs to be in order.
+  size_t Needed() const { return static_cast<size_t>(request_.offset + request_.limit); }
+  SearchHit LoadHit(const RankedDocument& ranked, const FoundWords& words);
+
+  StoreReader& reader_;
+  const SearchRequest& request_;
+};
+
+}  // namespace ferrox::engine

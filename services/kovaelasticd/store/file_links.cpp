@@ -1,0 +1,67 @@
+#include "services/kovaelasticd/store/file_links.h"
+
+#include <charconv>
+#include <optional>
+#include <vector>
+
+#include "services/kovaelasticd/store/store_rows.h"
+
+namespace ferrox::engine {
+
+namespace {
+
+/// 0: not known.
+int64_t FileOf(const std::string& stamp) {
+  const size_t dot = stamp.rfind('.');
+  uint64_t file = 0;
+  if (dot != std::string::npos) (void)std::from_chars(stamp.data() + dot + 1, stamp.data() + stamp.size(), file);
+  return static_cast<int64_t>(file);
+}
+
+}  // namespace
+
+void FileLinks::MakeTables() {
+  database_.Execute("CREATE TABLE IF NOT EXISTS files(file INTEGER, id INTEGER, PRIMARY KEY(file, id)) WITHOUT ROWID");
+  database_.Execute("CREATE TABLE IF NOT EXISTS suspects(id INTEGER PRIMARY KEY)");
+}
+
+std::string FileLinks::StampOf(const DocRow* row) const {
+  if (row == nullptr || row->kind == kFolder) return "";
+  const Json::Value stamp = UnpackDocument(*row, names_, {kStamp})[kStamp];
+  return stamp.isString() ? stamp.asString() : "";
+}
+
+void FileLinks::OnChange(int64_t id, const DocRow* before, const DocRow* after) {
+  const std::string old_stamp = StampOf(before);
+  const std::string stamp = StampOf(after);
+  database_.Prepare("DELETE FROM suspects WHERE id = ?1").Bind(1, id).Run();
+  const int64_t old_file = FileOf(old_stamp);
+  const int64_t file = FileOf(stamp);
+  if (old_file != file) {
+    if (old_file != 0) {
+      database_.Prepare("DELETE FROM files WHERE file = ?1 AND id = ?2").Bind(1, old_file).Bind(2, id).Run();
+      MarkOthers(old_file, id, "");
+    }
+    if (file != 0) database_.Prepare("INSERT INTO files VALUES(?1, ?2)").Bind(1, file).Bind(2, id).Run();
+  }
+  // Also when it was a suspect, or has the stamp of before: the document of another name may have been made
+  // before the file last changed, and been stored since.
+  if (file != 0) MarkOthers(file, id, stamp);
+}
+
+void FileLinks::MarkOthers(int64_t file, int64_t id, const std::string& stamp) {
+  std::vector<int64_t> others;
+  {
+    Statement statement =
+        database_.Prepare("SELECT id FROM files WHERE file = ?1 AND id <> ?2 AND id NOT IN (SELECT id FROM suspects)");
+    statement.Bind(1, file).Bind(2, id);
+    while (statement.Step()) others.push_back(statement.Int(0));
+  }
+  for (const int64_t other : others) {
+    const std::optional<StoredDocument> stored = FindDocument(database_, other);
+    if (!stored.has_value() || StampOf(&stored->row) == stamp) continue;
+    database_.Prepare("INSERT INTO suspects VALUES(?1)").Bind(1, other).Run();
+  }
+}
+
+}  // namespace ferrox::engine

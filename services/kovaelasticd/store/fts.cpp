@@ -1,0 +1,213 @@
+#include "services/kovaelasticd/store/fts.h"
+
+#include <algorithm>
+#include <cstring>
+#include <string_view>
+
+#include "services/kovaelasticd/store/document.h"
+#include "services/kovaelasticd/text/words.h"
+
+namespace ferrox::engine {
+
+namespace {
+
+// SQLite's FTS5 keeps the words; cutting text into words and counting hits is done here, by two extensions: the
+// tokenizer "kova" and the function kova_collect. A table is given three kinds of text, told apart by their first byte
+// (document.h): prose, which WordScanner cuts; a name, of which all groups of three characters are indexed; and ready
+// words. Queries are made of ready words, each quoted, so that none is taken for an operator.
+
+/// By this name sqlite3_value_pointer makes sure that the function is called by Collect and by no query of others.
+constexpr char kCollectorType[] = "HitCollector";
+/// A name has at most 255 bytes; a display text that takes its place is cut.
+constexpr size_t kNameGramsMax = 512;
+
+/// What FTS5 gives a tokenizer to hand its words to.
+using TokenSink = int (*)(void*, int, const char*, int, int, int);
+
+/// Hands words on to the full-text index.
+class TokenOutput {
+ public:
+  TokenOutput(void* context, TokenSink sink) : context_(context), sink_(sink) {}
+  bool Put(std::string_view word, size_t begin, size_t end) {
+    result_ =
+        sink_(context_, 0, word.data(), static_cast<int>(word.size()), static_cast<int>(begin), static_cast<int>(end));
+    return result_ == SQLITE_OK;
+  }
+  int Result() const { return result_; }
+
+ private:
+  void* context_;
+  TokenSink sink_;
+  int result_ = SQLITE_OK;
+};
+
+void PutGrams(TokenOutput& output, std::string_view text) {
+  for (const std::string& gram : Trigrams(text, kNameGramsMax)) {
+    if (!output.Put(gram, 0, 0)) return;
+  }
+}
+
+void PutReadyWords(TokenOutput& output, std::string_view text) {
+  while (!text.empty()) {
+    const size_t end = text.find(kReadyEnd);
+    if (end == std::string_view::npos || !output.Put(text.substr(0, end), 0, 0)) return;
+    text.remove_prefix(end + 1);
+  }
+}
+
+void PutWords(TokenOutput& output, std::string_view text) {
+  WordScanner scanner(text);
+  while (scanner.Next() && output.Put(scanner.Word(), scanner.Begin(), scanner.End())) {
+  }
+}
+
+int Tokenize(Fts5Tokenizer* /*tokenizer*/, void* context, int flags, const char* text, int size, TokenSink sink) {
+  const std::string_view all(text == nullptr ? "" : text, static_cast<size_t>(size));
+  TokenOutput output(context, sink);
+  if ((flags & FTS5_TOKENIZE_QUERY) != 0) {
+    (void)output.Put(all, 0, all.size());  // expressions are built from ready words
+  } else if (!all.empty() && all.front() == kGramsMark) {
+    PutGrams(output, all.substr(1));
+  } else if (!all.empty() && all.front() == kReadyMark) {
+    PutReadyWords(output, all.substr(1));
+  } else {
+    PutWords(output, all);
+  }
+  return output.Result();
+}
+
+/// The tokenizer has no state, but FTS5 wants an object.
+int CreateTokenizer(void* /*context*/, const char** /*arguments*/, int /*count*/, Fts5Tokenizer** tokenizer) {
+  static char stateless;
+  *tokenizer = reinterpret_cast<Fts5Tokenizer*>(&stateless);
+  return SQLITE_OK;
+}
+
+void DeleteTokenizer(Fts5Tokenizer* /*tokenizer*/) {}
+
+/// By MetaColumn.
+uint8_t PlaceOfColumn(int column) {
+  constexpr uint8_t kPlaces[] = {kInNamePart, kInName, kInTitle, kInText, kInText};
+  return column >= 0 && column <= kFieldsColumn ? kPlaces[column] : uint8_t{0};
+}
+
+/// What the rows of one phrase are collected with.
+struct PhraseVisit {
+  HitCollector* collector;
+  bool content;  ///< the table of contents, which has one column
+};
+
+/// Adds up one phrase's occurrences in a row.
+int ReadRowHits(const Fts5ExtensionApi* api, Fts5Context* row, int phrase, uint8_t& count, uint8_t& places) {
+  Fts5PhraseIter iterator;
+  int column = -1;
+  int offset = -1;
+  const int result = api->xPhraseFirst(row, phrase, &iterator, &column, &offset);
+  if (result != SQLITE_OK) return result;
+  for (; column >= 0 && count < kCountMax; api->xPhraseNext(row, &iterator, &column, &offset)) {
+    ++count;
+    places |= PlaceOfColumn(column);
+  }
+  return SQLITE_OK;
+}
+
+/// A row that xQueryPhrase visits: it has the one phrase.
+int VisitRow(const Fts5ExtensionApi* api, Fts5Context* row, void* user) {
+  const auto* visit = static_cast<const PhraseVisit*>(user);
+  uint8_t count = 0;
+  uint8_t places = 0;
+  const int result = ReadRowHits(api, row, 0, count, places);
+  if (result != SQLITE_OK) return result;
+  visit->collector->Add(api->xRowid(row), visit->content ? count : uint8_t{0}, visit->content ? uint8_t{0} : places);
+  return SQLITE_OK;
+}
+
+/// Hands the row under the caller's cursor to the collector.
+int CollectRow(const Fts5ExtensionApi* api, Fts5Context* row, PhraseVisit& visit) {
+  uint8_t count = 0;
+  uint8_t places = 0;
+  for (int phrase = 0; phrase < api->xPhraseCount(row); ++phrase) {
+    const int result = ReadRowHits(api, row, phrase, count, places);
+    if (result != SQLITE_OK) return result;
+  }
+  visit.collector->Add(api->xRowid(row), visit.content ? count : uint8_t{0}, visit.content ? uint8_t{0} : places);
+  return SQLITE_OK;
+}
+
+/// kova_collect(table, collector, all): with `all` not 0, walks all rows of each phrase of the expression, in place of
+/// the caller's cursor; else takes the row under the cursor.
+void CollectFunction(const Fts5ExtensionApi* api, Fts5Context* row, sqlite3_context* context, int count,
+                     sqlite3_value** arguments) {
+  auto* collector =
+      count == 2 ? static_cast<HitCollector*>(sqlite3_value_pointer(arguments[0], kCollectorType)) : nullptr;
+  if (collector == nullptr) {
+    sqlite3_result_error(context, "kova_collect is for the engine alone", -1);
+    return;
+  }
+  PhraseVisit visit = {collector, api->xColumnCount(row) == 1};
+  int result = SQLITE_OK;
+  if (sqlite3_value_int(arguments[1]) == 0) {
+    result = CollectRow(api, row, visit);
+  } else {
+    for (int phrase = 0; phrase < api->xPhraseCount(row) && result == SQLITE_OK; ++phrase) {
+      result = api->xQueryPhrase(row, phrase, &visit, &VisitRow);
+    }
+  }
+  if (result != SQLITE_OK) sqlite3_result_error_code(context, result);
+}
+
+/// FTS5 gives its functions to C code by this call.
+fts5_api* FullTextApi(Database& database) {
+  fts5_api* api = nullptr;
+  Statement statement = database.Prepare("SELECT fts5(?1)");
+  statement.BindPointer(1, &api, "fts5_api_ptr");
+  (void)statement.Step();
+  if (api == nullptr) database.Fail(SQLITE_ERROR);
+  return api;
+}
+
+}  // namespace
+
+void HitCollector::Add(int64_t id, uint8_t count, uint8_t places) {
+  set_.Add(id);
+  if (hits_.size() >= 2 * hits_max_) hits_.erase(hits_.begin(), hits_.end() - static_cast<ptrdiff_t>(hits_max_));
+  hits_.push_back({static_cast<uint32_t>(id), count, places});
+}
+
+std::vector<WordHit> HitCollector::TakeHits() { return std::move(hits_); }
+
+void RegisterFullText(Database& database) {
+  fts5_api* api = FullTextApi(database);
+  fts5_tokenizer tokenizer = {&CreateTokenizer, &DeleteTokenizer, &Tokenize};
+  database.Check(api->xCreateTokenizer(api, "kova", nullptr, &tokenizer, nullptr));
+  database.Check(api->xCreateFunction(api, "kova_collect", nullptr, &CollectFunction, nullptr));
+}
+
+std::string PhraseExpression(const std::vector<std::string>& words, bool prefix) {
+  std::string expression;
+  for (const std::string& word : words) {
+    if (!expression.empty()) expression += " + ";
+    expression += '"';
+    for (const char c : word) {
+      if (c == '"') expression += '"';
+      expression += c;
+    }
+    expression += '"';
+  }
+  return prefix ? expression + " *" : expression;
+}
+
+void Collect(Database& database, const char* table, const std::string& expression, bool prefix,
+             HitCollector& collector) {
+  const std::string name(table);
+  // To look for the beginning of a word, all words that have it are merged: that is done once, for the cursor.
+  // Otherwise the rows are walked inside the function, which costs less a row.
+  const std::string where = " FROM " + name + " WHERE " + name + " MATCH ?2";
+  Statement statement =
+      database.Prepare("SELECT kova_collect(" + name + ", ?1, " + (prefix ? "0)" + where : "1)" + where + " LIMIT 1"));
+  statement.BindPointer(1, &collector, kCollectorType).Bind(2, std::string_view(expression));
+  while (statement.Step()) {
+  }
+}
+
+}  // namespace ferrox::engine

@@ -1,0 +1,55 @@
+#pragma once
+
+#include <cstdint>
+#include <string>
+#include <vector>
+
+#include "services/kovaelasticd/store/doc_set.h"
+#include "services/kovaelasticd/store/sqlite_db.h"
+
+namespace ferrox::engine {
+
+/// The columns of the full-text table meta_fts; content_fts has one, the body.
+enum MetaColumn : int { kGramsColumn, kNameColumn, kTitleColumn, kTextColumn, kFieldsColumn };
+
+/// Where a search word stands in a document, beside its content.
+enum HitPlace : uint8_t { kInNamePart = 1, kInName = 2, kInTitle = 4, kInText = 8 };
+
+/// One document that a word was found in. Hundreds of thousands of them are kept for a frequent word.
+struct WordHit {
+  uint32_t id;
+  uint8_t count;   ///< how often it stands in the content, at most kCountMax
+  uint8_t places;  ///< a set of HitPlace
+};
+constexpr uint8_t kCountMax = 32;
+
+/// Collects the documents that a full-text expression finds: all of them in a set, and the `hits_max` added to the
+/// index last one by one, with their counts.
+class HitCollector {
+ public:
+  explicit HitCollector(size_t hits_max) : hits_max_(hits_max) {}
+  /// Documents come in ascending order, phrase by phrase.
+  void Add(int64_t id, uint8_t count, uint8_t places);
+  const DocSet& Set() const { return set_; }
+  DocSet TakeSet() { return std::move(set_); }
+  /// In ascending order of documents; those of several phrases follow each other.
+  std::vector<WordHit> TakeHits();
+
+ private:
+  size_t hits_max_;
+  DocSet set_;
+  std::vector<WordHit> hits_;
+};
+
+/// Makes our tokenizer ("kova") and the function kova_collect known to a connection.
+void RegisterFullText(Database& database);
+
+/// The expression for the words as a phrase, in the full-text language; `prefix` holds for the last one.
+std::string PhraseExpression(const std::vector<std::string>& words, bool prefix);
+
+/// Hands every document that the expression finds in the full-text table `table` to `collector`. `prefix` tells that it
+/// looks for the beginning of a word.
+void Collect(Database& database, const char* table, const std::string& expression, bool prefix,
+             HitCollector& collector);
+
+}  // namespace ferrox::engine

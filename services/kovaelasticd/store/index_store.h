@@ -1,0 +1,106 @@
+#pragma once
+
+#include <cstdint>
+#include <functional>
+#include <map>
+#include <memory>
+#include <string>
+#include <vector>
+
+#include <json/value.h>
+
+#include "services/kovaelasticd/query/query.h"
+
+namespace ferrox::engine {
+
+/// Which documents Get lists: the one at `term`, or the suspects, or the unread, or those of `file`, or those whose
+/// path begins with `prefix`, in the order of their paths.
+struct GetRequest {
+  std::string term;
+  std::string prefix;
+  std::string after;                ///< only paths behind this one
+  int64_t limit = -1;               ///< at most so many; below 0: all
+  std::vector<std::string> fields;  ///< the fields to load; empty: all
+  /// Documents that may be older than their file, since a change was reported under another of its names only.
+  bool suspects = false;
+  bool unread = false;  ///< documents with "_KOVAExtractError"
+  uint64_t file = 0;    ///< the number at the end of "_KOVAStamp"; 0: not asked for
+};
+
+/// What hits are ordered by.
+enum class SortKey { kRelevance, kDate, kName, kSize };
+
+/// A search in one index.
+struct SearchRequest {
+  const QueryNode* query = nullptr;  ///< lives as long as the search
+  int64_t offset = 0;
+  int64_t limit = 20;
+  SortKey sort = SortKey::kRelevance;
+  bool ascending = false;
+  bool snippet = true;
+  size_t ranked_max = 200000;  ///< so many documents, the newest added, are ranked at most for one word
+  std::string mark_start = "[";
+  std::string mark_end = "]";
+};
+
+/// A document that was found, as it is shown.
+struct SearchHit {
+  std::string path;
+  double score = 0;
+  int64_t number_key = 0;  ///< date or size, for merging the hits of several indices
+  std::string name_key;    ///< the name, for the same
+  std::string snippet;
+  Json::Value fields;
+};
+
+struct SearchReply {
+  int64_t total = 0;                     ///< all documents found, whether shown or not
+  bool ranking_bounded = false;          ///< there were more than ranked_max to order; some were left out of that
+  std::vector<SearchHit> hits;           ///< from the first, offset + limit of them at most
+  std::vector<std::string> suggestions;  ///< other spellings, when nothing was found
+};
+
+/// Figures of an index; those of documents are as of its last commit.
+struct StoreStat {
+  int64_t documents = 0;
+  int64_t with_content = 0;                       ///< of these, those with text
+  int64_t bytes_on_disk = 0;                      ///< of all its files
+  int64_t text_bytes = 0;                         ///< of all texts, unpacked
+  std::map<std::string, int64_t> extract_errors;  ///< documents for each reason why content could not be read
+  std::map<std::string, std::vector<std::string>> extract_error_examples;  ///< of each reason, one or two paths
+};
+
+/// One index: its documents, and what finds them. Changes, Get and Commit are for one thread at a time; Search and Stat
+/// may be called by any number of others meanwhile, never wait for a change, and see what was committed.
+/// Every member throws Error kEngineStorage, with the file and the remedy, when the disk is full or the file is
+/// unusable; after that, call Rollback.
+class IndexStore {
+ public:
+  IndexStore() = default;
+  IndexStore(const IndexStore&) = delete;
+  IndexStore& operator=(const IndexStore&) = delete;
+  virtual ~IndexStore();
+
+  /// Stores a document in place of the one at `path`, if there is one.
+  virtual void Upsert(const std::string& path, const Json::Value& document) = 0;
+  /// Changes members of the document at `path`; null removes one. A new KOVAMDPath moves the document and replaces
+  /// what is there. @throws Error kEngineNoSuchDocument, nothing is changed then.
+  virtual void Set(const std::string& path, const Json::Value& changes) = 0;
+  virtual void Delete(const std::string& path) = 0;
+  virtual void DeletePrefix(const std::string& prefix) = 0;
+  /// Lists documents, uncommitted ones too.
+  virtual void Get(const GetRequest& request, const std::function<void(const Json::Value&)>& take) = 0;
+  /// Makes all changes durable and visible to Search.
+  virtual void Commit() = 0;
+  /// Forgets the changes since the last commit.
+  virtual void Rollback() = 0;
+  /// How much has been changed since the last commit, in bytes of text, roughly.
+  virtual int64_t UncommittedBytes() const = 0;
+  /// Rebuilds the words that are suggested when a search finds nothing.
+  virtual void RebuildSuggestions() = 0;
+
+  virtual SearchReply Search(const SearchRequest& request) = 0;
+  virtual StoreStat Stat() = 0;
+};
+
+}  // namespace ferrox::engine

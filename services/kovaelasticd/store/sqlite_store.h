@@ -1,0 +1,72 @@
+#pragma once
+
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "services/kovaelasticd/store/document.h"
+#include "services/kovaelasticd/store/file_links.h"
+#include "services/kovaelasticd/store/index_store.h"
+#include "services/kovaelasticd/store/sqlite_db.h"
+#include "services/kovaelasticd/store/store_reader.h"
+#include "services/kovaelasticd/store/store_rows.h"
+#include "services/kovaelasticd/store/text_writer.h"
+#include "services/kovaelasticd/text/schema.h"
+
+namespace ferrox::engine {
+
+/// An index in one SQLite file (docs/formats/engine.md lists its tables). One connection writes: rows of "docs" at
+/// once, words through a TextWriter when the changes are committed or have grown large. Searches use connections of
+/// their own (ReaderPool) in SQLite's write-ahead mode: each sees the last commit as it began, and none waits for a
+/// writer.
+class SqliteStore : public IndexStore {
+ public:
+  /// Opens the file, or makes it with `create` when it is missing.
+  SqliteStore(const std::string& path, bool create, std::shared_ptr<const Schema> schema);
+  ~SqliteStore() override;
+
+  void Upsert(const std::string& path, const Json::Value& document) override;
+  void Set(const std::string& path, const Json::Value& changes) override;
+  void Delete(const std::string& path) override;
+  void DeletePrefix(const std::string& prefix) override;
+  void Get(const GetRequest& request, const std::function<void(const Json::Value&)>& take) override;
+  void Commit() override;
+  void Rollback() override;
+  int64_t UncommittedBytes() const override { return uncommitted_bytes_; }
+  void RebuildSuggestions() override;
+  SearchReply Search(const SearchRequest& request) override;
+  StoreStat Stat() override;
+
+  /// The largest size of the file, in pages; for tests of a full disk. 0: no limit.
+  void LimitPages(int64_t pages);
+
+ private:
+  /// Opens the transaction that the changes until the next commit share.
+  void Begin();
+  void ShortenLog();
+
+  // What changes a document's row; its words go to texts_.
+  int64_t InsertRow(const DocRow& row, int64_t text_bytes);
+  void UpdateRow(int64_t id, const DocRow& row, int64_t text_bytes);
+  void Remove(const StoredDocument& stored);
+  void RemoveAt(const std::string& path);
+  /// Keeps the sums, for a text that had `before` bytes and has `after` now.
+  void CountText(int64_t before, int64_t after);
+  void Changed(int64_t bytes);
+  /// A document as Get returns it, with the changes that are not committed.
+  Json::Value LoadEntry(const StoredDocument& stored, const std::vector<std::string>& fields);
+
+  const std::shared_ptr<const Schema> schema_;
+  // Of the thread that writes.
+  Database writer_;
+  FieldNames names_;
+  FileLinks links_{writer_, names_};
+  TextWriter texts_{writer_, names_, schema_};
+  Totals totals_;                  ///< with the changes of the open transaction
+  int64_t uncommitted_bytes_ = 0;  ///< for the automatic commit: texts, and a fixed amount for each change
+  bool in_transaction_ = false;    ///< since the first change after a commit
+
+  ReaderPool readers_;  ///< for Search and Stat, on any thread
+};
+
+}  // namespace ferrox::engine

@@ -1,0 +1,38 @@
+#include "services/kovaelasticd/store/store_reader.h"
+
+#include "services/kovaelasticd/store/fts.h"
+
+namespace ferrox::engine {
+
+namespace {
+
+/// More searches at a time than that open connections of their own, each with a page cache of up to 8 MiB.
+constexpr size_t kIdleMax = 4;
+
+}  // namespace
+
+StoreReader::StoreReader(const std::string& path) : database(path, Database::Mode::kRead) {
+  database.Execute("PRAGMA cache_size = -8192");
+  RegisterFullText(database);
+  database.Execute("CREATE VIRTUAL TABLE temp.meta_terms USING fts5vocab('main', 'meta_fts', 'instance')");
+  database.Execute("PRAGMA query_only = 1");
+}
+
+std::unique_ptr<StoreReader> ReaderPool::Borrow() {
+  {
+    const base::MutexLock guard(mutex_);
+    if (!idle_.empty()) {
+      std::unique_ptr<StoreReader> reader = std::move(idle_.back());
+      idle_.pop_back();
+      return reader;
+    }
+  }
+  return std::make_unique<StoreReader>(path_);
+}
+
+void ReaderPool::Return(std::unique_ptr<StoreReader> reader) {
+  const base::MutexLock guard(mutex_);
+  if (idle_.size() < kIdleMax) idle_.push_back(std::move(reader));
+}
+
+}  // namespace ferrox::engine

@@ -1,0 +1,40 @@
+#pragma once
+
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "base/mutex.h"
+#include "services/kovaelasticd/store/document.h"
+#include "services/kovaelasticd/store/sqlite_db.h"
+#include "services/kovaelasticd/store/text_codec.h"
+
+namespace ferrox::engine {
+
+/// A connection that only reads, with what is needed to understand its rows. For one thread at a time.
+struct StoreReader {
+  explicit StoreReader(const std::string& path);
+  Database database;
+  FieldNames names;  ///< as far as its last user has loaded them
+  TextCodec codec;
+};
+
+/// The reading connections of one index. A new one has to read the schema and to prepare each statement again, so a few
+/// are kept for the next searches. Any thread may call any member.
+class ReaderPool {
+ public:
+  /// `path` is the index file.
+  explicit ReaderPool(std::string path) : path_(std::move(path)) {}
+
+  /// An idle connection, or a new one: a search never waits for another. @throws Error kEngineStorage, IndexDamaged.
+  std::unique_ptr<StoreReader> Borrow();
+  /// Takes a connection back that has no transaction open. After a failure do not return it: it is closed then.
+  void Return(std::unique_ptr<StoreReader> reader);
+
+ private:
+  const std::string path_;
+  base::Mutex mutex_;
+  std::vector<std::unique_ptr<StoreReader>> idle_ BASE_GUARDED_BY(mutex_);
+};
+
+}  // namespace ferrox::engine

@@ -1,0 +1,120 @@
+#define FERROX_SOURCE "sqlite_store_write"
+
+#include "services/kovaelasticd/store/store_rows.h"
+
+#include <algorithm>
+
+#include "base/text.h"
+#include "common/log.h"
+
+namespace ferrox::engine {
+
+namespace {
+
+/// More names than that come from no extractor.
+constexpr int64_t kFieldNamesMax = 4096;
+
+}  // namespace
+
+StoredDocument ReadRow(const Statement& statement) {
+  StoredDocument stored;
+  stored.id = statement.Int(0);
+  stored.row.path = statement.Text(1);
+  stored.row.name = statement.Text(2);
+  stored.row.ext = statement.Text(3);
+  stored.row.kind = static_cast<int32_t>(statement.Int(4));
+  if (!statement.IsNull(5)) stored.row.size = statement.Int(5);
+  if (!statement.IsNull(6)) stored.row.mtime = statement.Int(6);
+  stored.text_bytes = statement.Int(7);
+  stored.row.derived = static_cast<uint32_t>(statement.Int(8));
+  stored.row.error = statement.Text(9);
+  stored.row.packed = statement.Text(10);
+  return stored;
+}
+
+void BindRow(Statement& statement, const DocRow& row, int64_t text_bytes) {
+  statement.Bind(2, std::string_view(row.path)).Bind(3, std::string_view(row.name)).Bind(4, std::string_view(row.ext));
+  statement.Bind(5, int64_t{row.kind});
+  row.size.has_value() ? statement.Bind(6, *row.size) : statement.BindNull(6);
+  row.mtime.has_value() ? statement.Bind(7, *row.mtime) : statement.BindNull(7);
+  statement.Bind(8, text_bytes).Bind(9, int64_t{row.derived});
+  row.error.empty() ? statement.BindNull(10) : statement.Bind(10, std::string_view(row.error));
+  statement.BindBlob(11, row.packed);
+}
+
+std::optional<StoredDocument> FindDocument(Database& database, const std::string& path) {
+  static const std::string sql = std::string(kSelectRow) + "WHERE path = ?1";
+  Statement statement = database.Prepare(sql);
+  statement.Bind(1, std::string_view(path));
+  return statement.Step() ? std::optional<StoredDocument>(ReadRow(statement)) : std::nullopt;
+}
+
+std::optional<StoredDocument> FindDocument(Database& database, int64_t id) {
+  static const std::string sql = std::string(kSelectRow) + "WHERE id = ?1";
+  Statement statement = database.Prepare(sql);
+  statement.Bind(1, id);
+  return statement.Step() ? std::optional<StoredDocument>(ReadRow(statement)) : std::nullopt;
+}
+
+Totals LoadTotals(Database& database) {
+  Totals totals;
+  Statement statement = database.Prepare("SELECT key, value FROM info");
+  while (statement.Step()) {
+    const std::string_view key = statement.Text(0);
+    if (key == "documents") totals.documents = statement.Int(1);
+    if (key == "with_content") totals.with_content = statement.Int(1);
+    if (key == "text_bytes") totals.text_bytes = statement.Int(1);
+  }
+  return totals;
+}
+
+void SaveTotals(Database& database, const Totals& totals) {
+  const std::pair<std::string_view, int64_t> values[] = {
+      {"documents", totals.documents}, {"with_content", totals.with_content}, {"text_bytes", totals.text_bytes}};
+  Statement statement = database.Prepare("INSERT OR REPLACE INTO info(key, value) VALUES(?1, ?2)");
+  for (const auto& [key, value] : values) statement.Bind(1, key).Bind(2, value).Run();
+}
+
+void LoadFieldNames(Database& database, FieldNames& names) {
+  Statement statement = database.Prepare("SELECT number, name FROM fields WHERE number > ?1 ORDER BY number");
+  statement.Bind(1, names.Largest());
+  while (statement.Step()) names.Add(statement.Int(0), std::string(statement.Text(1)));
+}
+
+void AddFieldNames(Database& database, FieldNames& names, const Json::Value& document) {
+  for (const std::string& name : NamesNeeded(document, names)) {
+    const int64_t number = names.Largest() + 1;
+    FERROX_FAIL_IF(number > kFieldNamesMax, Error::kEngineBadRequest,
+                   "field \"" + name + "\" is one too many: an index holds at most " + std::to_string(kFieldNamesMax) +
+                       " different field names");
+    database.Prepare("INSERT INTO fields(number, name) VALUES(?1, ?2)")
+        .Bind(1, number)
+        .Bind(2, std::string_view(name))
+        .Run();
+    names.Add(number, name);
+  }
+}
+
+PrefixRange::PrefixRange(std::string prefix) : begin_(prefix) {
+  while (!prefix.empty() && static_cast<unsigned char>(prefix.back()) == 0xFF) prefix.pop_back();
+  if (!prefix.empty()) prefix.back() = static_cast<char>(static_cast<unsigned char>(prefix.back()) + 1);
+  end_ = prefix;
+}
+
+void PrefixRange::Bind(Statement& statement) const {
+  statement.Bind(1, std::string_view(begin_));
+  // SQLite orders any blob behind all texts.
+  end_.empty() ? statement.BindBlob(2, "") : statement.Bind(2, std::string_view(end_));
+}
+
+int CompareNames(std::string_view a, std::string_view b) {
+  const auto byte = [](char c) { return static_cast<unsigned char>(base::LowerAscii(c)); };
+  const size_t common = std::min(a.size(), b.size());
+  for (size_t i = 0; i < common; ++i) {
+    const int difference = byte(a[i]) - byte(b[i]);
+    if (difference != 0) return difference;
+  }
+  return a.size() == b.size() ? 0 : a.size() < b.size() ? -1 : 1;
+}
+
+}  // namespace ferrox::engine

@@ -1,0 +1,125 @@
+#include "services/kovaelasticd/store/text_writer.h"
+
+namespace ferrox::engine {
+
+namespace {
+
+/// How many bytes of text may wait. New documents only have higher numbers than those written before, so they are
+/// written in small amounts, and callers that wait for the index's thread wait less. A Flush that begins with a lower
+/// number makes the full-text tables write out what they have gathered, so changes of old documents wait longer.
+constexpr int64_t kPendingMaxBytes = 16 << 20;
+constexpr int64_t kPendingNewMaxBytes = 2 << 20;
+
+std::optional<std::string> TextOrNone(std::string_view text) {
+  return text.empty() ? std::nullopt : std::optional<std::string>(text);
+}
+
+}  // namespace
+
+/// The document's entry, made from what is stored when it has none.
+TextWriter::Pending& TextWriter::PendingOf(const StoredDocument& stored) {
+  const auto [place, made] = pending_.try_emplace(stored.id);
+  if (made) {
+    const Json::Value document = UnpackDocument(stored.row, names_, {});
+    place->second.old_meta = MakeMetaText(stored.row, document, *schema_);
+    place->second.new_meta = place->second.old_meta;
+  }
+  return place->second;
+}
+
+void TextWriter::Add(int64_t id, MetaText meta, std::string_view text) {
+  // A number may be that of a document removed just now, whose words are still to be removed.
+  Pending& pending = pending_[id];
+  pending.new_meta = std::move(meta);
+  pending.text_changed = true;
+  pending.text = TextOrNone(text);
+}
+
+void TextWriter::Replace(const StoredDocument& before, MetaText meta, std::optional<std::string_view> text) {
+  Pending& pending = PendingOf(before);
+  pending.new_meta = std::move(meta);
+  if (text.has_value()) {
+    pending.text_changed = true;
+    pending.text = TextOrNone(*text);
+  } else if (!pending.text_changed && pending.new_meta == pending.old_meta) {
+    pending_.erase(before.id);
+  }
+}
+
+void TextWriter::Remove(const StoredDocument& before) {
+  Pending& pending = PendingOf(before);
+  pending.new_meta.reset();
+  pending.text_changed = true;
+  pending.text.reset();
+}
+
+void TextWriter::Changed(int64_t bytes) {
+  pending_bytes_ += bytes;
+  const bool ids_grow = !pending_.empty() && pending_.begin()->first > last_written_;
+  if (pending_bytes_ >= (ids_grow ? kPendingNewMaxBytes : kPendingMaxBytes)) Flush();
+}
+
+std::string TextWriter::Text(int64_t id) {
+  const auto waiting = pending_.find(id);
+  const bool waits = waiting != pending_.end() && waiting->second.text_changed;
+  return waits ? waiting->second.text.value_or("") : StoredText(id);
+}
+
+std::string TextWriter::StoredText(int64_t id) {
+  Statement statement = database_.Prepare("SELECT zstd FROM bodies WHERE id = ?1");
+  statement.Bind(1, id);
+  return statement.Step() ? std::string(codec_.Unpack(statement.Text(0))) : std::string();
+}
+
+void TextWriter::Flush() {
+  for (const auto& [id, pending] : pending_) {
+    if (pending.text_changed) WriteText(id, pending);
+  }
+  for (const auto& [id, pending] : pending_) WriteMeta(id, pending);
+  if (!pending_.empty()) last_written_ = pending_.rbegin()->first;
+  pending_.clear();
+  pending_bytes_ = 0;
+}
+
+void TextWriter::Forget() {
+  pending_.clear();
+  pending_bytes_ = 0;
+}
+
+/// The old text is in "bodies" still, which is what the full-text table was given.
+void TextWriter::WriteText(int64_t id, const Pending& pending) {
+  if (pending.old_meta.has_value()) {
+    const std::string before = StoredText(id);
+    if (before == pending.text.value_or("")) return;
+    if (!before.empty()) {
+      Statement remove =
+          database_.Prepare("INSERT INTO content_fts(content_fts, rowid, body) VALUES('delete', ?1, ?2)");
+      remove.Bind(1, id).Bind(2, std::string_view(before)).Run();
+      database_.Prepare("DELETE FROM bodies WHERE id = ?1").Bind(1, id).Run();
+    }
+  }
+  if (!pending.text.has_value()) return;
+  Statement insert = database_.Prepare("INSERT INTO content_fts(rowid, body) VALUES(?1, ?2)");
+  insert.Bind(1, id).Bind(2, std::string_view(*pending.text)).Run();
+  Statement store = database_.Prepare("INSERT INTO bodies(id, zstd) VALUES(?1, ?2)");
+  store.Bind(1, id).BindBlob(2, codec_.Pack(*pending.text)).Run();
+}
+
+void TextWriter::WriteMeta(int64_t id, const Pending& pending) {
+  if (pending.old_meta == pending.new_meta) return;
+  if (pending.old_meta.has_value()) InsertMeta(id, *pending.old_meta, true);
+  if (pending.new_meta.has_value()) InsertMeta(id, *pending.new_meta, false);
+}
+
+/// Adds words to the full-text table, or removes them: both are insertions, the latter with the command 'delete'.
+void TextWriter::InsertMeta(int64_t id, const MetaText& meta, bool remove) {
+  Statement statement = database_.Prepare(
+      remove ? "INSERT INTO meta_fts(meta_fts, rowid, grams, name, title, text, fields)"
+               " VALUES('delete', ?1, ?2, ?3, ?4, ?5, ?6)"
+             : "INSERT INTO meta_fts(rowid, grams, name, title, text, fields) VALUES(?1, ?2, ?3, ?4, ?5, ?6)");
+  statement.Bind(1, id).Bind(2, std::string_view(meta.grams)).Bind(3, std::string_view(meta.name));
+  statement.Bind(4, std::string_view(meta.title)).Bind(5, std::string_view(meta.text));
+  statement.Bind(6, std::string_view(meta.fields)).Run();
+}
+
+}  // namespace ferrox::engine
