@@ -1,4 +1,5 @@
 // Catches sequences of events that fold into operations unlike the plain model of the rules says.
+#include <algorithm>
 #include <random>
 
 #include <gtest/gtest.h>
@@ -34,6 +35,13 @@ std::vector<std::shared_ptr<Event>> EventsOn(const std::vector<std::string>& pat
   return events;
 }
 
+// Sanitizers look at how memory is used, which a part of all sequences shows; each is slow with them.
+#ifdef FERROX_SANITIZED
+constexpr int kStride = 8;
+#else
+constexpr int kStride = 1;
+#endif
+
 class OPTreeModelTest : public testing::Test {
  protected:
   OPTreeModelTest() { WriteFile(dir_ / "empty", ""); }
@@ -68,7 +76,9 @@ TEST_F(OPTreeModelTest, EverySequenceOfUpToThreeEventsOnThreePaths) {
       ASSERT_TRUE(Agree({first}));
       for (const auto& second : events) {
         ASSERT_TRUE(Agree({first, second}));
-        for (const auto& third : events) ASSERT_TRUE(Agree({first, second, third}));
+        for (size_t third = 0; third < events.size(); third += kStride) {
+          ASSERT_TRUE(Agree({first, second, events[third]}));
+        }
       }
     }
   }
@@ -76,7 +86,7 @@ TEST_F(OPTreeModelTest, EverySequenceOfUpToThreeEventsOnThreePaths) {
 
 TEST_F(OPTreeModelTest, LongRandomSequences) {
   const auto events = EventsOn({"/a", "/a/b", "/a/b/c", "/a/d", "/e", "/e/b", "/e/b/f"});
-  for (int round = 0; round < 2000; ++round) {
+  for (int round = 0; round < 2000 / kStride; ++round) {
     std::vector<std::shared_ptr<Event>> sequence;
     for (int i = 0; i < 20; ++i) sequence.push_back(events[random_() % events.size()]);
     ASSERT_TRUE(Agree(sequence));
@@ -90,7 +100,7 @@ TEST_F(OPTreeModelTest, RandomSequencesAboveManyIdleNodes) {
   }
   idle.push_back(newClass<Event>(Reindex("/a/b")));
   const auto events = EventsOn({"/a", "/a/b/1/1", "/a/b", "/a/d", "/e", "/e/b/1", "/e/b"});
-  for (int round = 0; round < 4; ++round) {
+  for (int round = 0; round < std::max(1, 4 / kStride); ++round) {
     std::vector<std::shared_ptr<Event>> sequence = idle;
     while (sequence.size() < idle.size() + 20) {
       const auto& event = events[random_() % events.size()];
