@@ -4,11 +4,11 @@
 /// field "KOVAMDPath" is kKOVAMDPath, "_KOVAMDUserTags" is k_KOVAMDUserTags. Stored documents use them: a name never
 /// changes, odd as some are ("KOVAMDContactKeyworlds", "KOVAMDRecodingDate", "KOVAStateOrProvince").
 ///
-/// The library, the engine, the index daemon and the tool take the names from here, so that one that is spelt wrong
-/// does not compile. The host's platform and the readers of formats, which stand without the library, spell them
-/// themselves; what a reader gives under any other name is dropped (kovacontentextractd/answer.cpp). The types of the
-/// fields, and how they are searched, are those of the index's mappings (elastic::GetFileIndexMappings). The families
-/// of names:
+/// All sources take the names from here, so that one that is spelt wrong does not compile; in JSON that is written out
+/// as a text (the index's mappings, the tests' requests) they stand as they are. The header needs no library: the
+/// workers that read files, and the host's platform, use nothing else of the library's. What a worker gives under any
+/// other name is dropped (kovacontentextractd/answer.cpp). The types of the fields, and how they are searched, are
+/// those of the mappings (elastic::GetFileIndexMappings). The families of names:
 ///
 ///   KOVAMDFS...          facts about the file that need no look into it: size, dates, name
 ///   KOVAMDPath, -Parent  where it lies; the document's id is its path

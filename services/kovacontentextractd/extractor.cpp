@@ -19,13 +19,10 @@
 #include "services/kovacontentextractd/readers/reader.h"
 #include "services/kovacontentextractd/readers/utf8.h"
 #include "services/support/json_command.h"
-#include "wire/fields.h"
 
 namespace ferrox::extract {
 
 namespace {
-
-namespace field = fileindex::elastic;
 
 using namespace kova::content;
 

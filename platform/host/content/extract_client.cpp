@@ -28,10 +28,13 @@
 #include "platform/host/child_service.h"
 #include "platform/host/share_table.h"
 #include "platform/shared/frames.h"
+#include "wire/fields.h"
 
 namespace kova::content {
 
 namespace {
+
+namespace field = ferrox::fileindex::elastic;
 
 using SteadyClock = std::chrono::steady_clock;
 
@@ -203,7 +206,8 @@ Extraction ExtractContent(const std::string& path) {
   extraction.gone = data["gone"].isBool() && data["gone"].asBool();
   extraction.inode = data["inode"].isUInt64() ? data["inode"].asUInt64() : 0;
   extraction.document = std::move(data["document"]);
-  if (!text.empty()) extraction.document["KOVAMDTextContent"] = Json::Value(text.data(), text.data() + text.size());
+  if (!text.empty())
+    extraction.document[field::kKOVAMDTextContent] = Json::Value(text.data(), text.data() + text.size());
   return extraction;
 }
 

@@ -8,10 +8,13 @@
 #include <stdexcept>
 
 #include "platform/shared/stamp.h"
+#include "wire/fields.h"
 
 namespace kova::content {
 
 namespace {
+
+namespace field = ferrox::fileindex::elastic;
 
 constexpr uint64_t kBlockBytes = 512;
 
@@ -32,14 +35,14 @@ std::string Stamp(const struct statx& info) {
 }
 
 void AddSizesAndDates(const struct statx& info, Json::Value& document) {
-  document["KOVAMDFSSize"] = static_cast<Json::UInt64>(info.stx_size);
-  document["KOVAMDLogicalSize"] = static_cast<Json::UInt64>(info.stx_size);
-  document["KOVAMDPhysicalSize"] = static_cast<Json::UInt64>(info.stx_blocks * kBlockBytes);
-  document["KOVAMDFSContentChangeDate"] = static_cast<Json::Int64>(info.stx_mtime.tv_sec);
-  document["KOVAMDContentModificationDate"] = static_cast<Json::Int64>(info.stx_mtime.tv_sec);
-  document["KOVAMDAttributeChangeDate"] = static_cast<Json::Int64>(info.stx_ctime.tv_sec);
+  document[field::kKOVAMDFSSize] = static_cast<Json::UInt64>(info.stx_size);
+  document[field::kKOVAMDLogicalSize] = static_cast<Json::UInt64>(info.stx_size);
+  document[field::kKOVAMDPhysicalSize] = static_cast<Json::UInt64>(info.stx_blocks * kBlockBytes);
+  document[field::kKOVAMDFSContentChangeDate] = static_cast<Json::Int64>(info.stx_mtime.tv_sec);
+  document[field::kKOVAMDContentModificationDate] = static_cast<Json::Int64>(info.stx_mtime.tv_sec);
+  document[field::kKOVAMDAttributeChangeDate] = static_cast<Json::Int64>(info.stx_ctime.tv_sec);
   if ((info.stx_mask & STATX_BTIME) != 0 && info.stx_btime.tv_sec != 0) {  // 0: made by an image builder, not known
-    document["KOVAMDFSCreationDate"] = static_cast<Json::Int64>(info.stx_btime.tv_sec);
+    document[field::kKOVAMDFSCreationDate] = static_cast<Json::Int64>(info.stx_btime.tv_sec);
   }
 }
 
@@ -74,16 +77,16 @@ Facts AddFacts(const std::string& path, Json::Value& document) {
   const std::string name = path.substr(slash + 1);
   facts.extension = ExtensionOf(name);
   document = Json::Value(Json::objectValue);
-  document["KOVAMDPath"] = path;
-  document["KOVAMDParent"] = slash == std::string::npos ? std::string() : path.substr(0, slash);
-  document["KOVAMDFSName"] = name;
-  document["KOVAMDDisplayName"] = name;
-  document["KOVAMDKind"] = facts.extension;
-  document["KOVAMDExtension"] = facts.extension;
-  document["KOVAMDIsDir"] = S_ISDIR(facts.info.stx_mode);
-  document["KOVAMDOwnerUserID"] = std::to_string(facts.info.stx_uid);
-  document["KOVAMDOwnerGroupID"] = std::to_string(facts.info.stx_gid);
-  document["_KOVAStamp"] = Stamp(facts.info);
+  document[field::kKOVAMDPath] = path;
+  document[field::kKOVAMDParent] = slash == std::string::npos ? std::string() : path.substr(0, slash);
+  document[field::kKOVAMDFSName] = name;
+  document[field::kKOVAMDDisplayName] = name;
+  document[field::kKOVAMDKind] = facts.extension;
+  document[field::kKOVAMDExtension] = facts.extension;
+  document[field::kKOVAMDIsDir] = S_ISDIR(facts.info.stx_mode);
+  document[field::kKOVAMDOwnerUserID] = std::to_string(facts.info.stx_uid);
+  document[field::kKOVAMDOwnerGroupID] = std::to_string(facts.info.stx_gid);
+  document[field::k_KOVAStamp] = Stamp(facts.info);
   AddSizesAndDates(facts.info, document);
   return facts;
 }

@@ -12,10 +12,13 @@
 #include "platform/host/content/extract_client.h"
 #include "platform/host/content/facts.h"
 #include "platform/host/content/programs.h"
+#include "wire/fields.h"
 
 namespace kova::content {
 
 namespace {
+
+namespace field = ferrox::fileindex::elastic;
 
 /// Whether another file has taken the place of the one that was examined. There are file systems on which the numbers
 /// of an open file are always others than those of its path.
@@ -51,12 +54,12 @@ void ParseFile(const std::string& path, const Json::Value& config, Json::Value& 
   const Facts facts = AddFacts(path, document);
   const char* special = TypeByMode(facts.info.stx_mode);
   const char* type = special != nullptr ? special : TypeByExtension(facts.extension);
-  if (type != nullptr) document["KOVAMDContentType"] = type;
+  if (type != nullptr) document[field::kKOVAMDContentType] = type;
   if (!WantsContent(config) || S_ISDIR(facts.info.stx_mode)) return;
-  document["_KOVANeedMeta"] = true;
-  document["_KOVAExtractVersion"] = ExtractVersion(type != nullptr ? type : "");
+  document[field::k_KOVANeedMeta] = true;
+  document[field::k_KOVAExtractVersion] = ExtractVersion(type != nullptr ? type : "");
   if (special != nullptr) {
-    document["_KOVAExtractError"] = "not a regular file";
+    document[field::k_KOVAExtractError] = "not a regular file";
   } else if (facts.info.stx_size > 0 && (type == nullptr || FormatOf(type) != nullptr)) {
     AddContent(path, facts, document);
   }

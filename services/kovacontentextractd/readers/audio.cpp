@@ -34,13 +34,13 @@ namespace {
 
 /// Length, rates and channels, where the library found them.
 void AddProperties(const TagLib::AudioProperties& properties, Findings& findings) {
-  findings.Set("KOVAMDMediaTypes", "Sound");
+  findings.Set(field::kKOVAMDMediaTypes, "Sound");
   if (properties.lengthInMilliseconds() > 0) {
-    findings.SetNumber("KOVAMDDurationSecond", properties.lengthInMilliseconds() / 1000.0);
+    findings.SetNumber(field::kKOVAMDDurationSecond, properties.lengthInMilliseconds() / 1000.0);
   }
-  if (properties.bitrate() > 0) findings.SetInteger("KOVAMDAudioBitRate", int64_t{properties.bitrate()} * 1000);
-  if (properties.sampleRate() > 0) findings.SetInteger("KOVAMDAudioSampleRate", properties.sampleRate());
-  if (properties.channels() > 0) findings.SetInteger("KOVAMDAudioChannelCount", properties.channels());
+  if (properties.bitrate() > 0) findings.SetInteger(field::kKOVAMDAudioBitRate, int64_t{properties.bitrate()} * 1000);
+  if (properties.sampleRate() > 0) findings.SetInteger(field::kKOVAMDAudioSampleRate, properties.sampleRate());
+  if (properties.channels() > 0) findings.SetInteger(field::kKOVAMDAudioChannelCount, properties.channels());
 }
 
 /// By the number that a WAV file has for it.
@@ -111,7 +111,7 @@ void AddOggLength(TagLib::File& file, Findings& findings) {
   const int rate = ogg->audioProperties()->sampleRate();
   const TagLib::Ogg::PageHeader* last = ogg->lastPageHeader();
   if (rate > 0 && last != nullptr && last->absoluteGranularPosition() > 0) {
-    findings.SetNumber("KOVAMDDurationSecond", static_cast<double>(last->absoluteGranularPosition()) / rate);
+    findings.SetNumber(field::kKOVAMDDurationSecond, static_cast<double>(last->absoluteGranularPosition()) / rate);
   }
 }
 
@@ -121,15 +121,16 @@ void AddOggLength(TagLib::File& file, Findings& findings) {
 void ReadDsf(const Source& source, const std::string& head, Findings& findings) {
   constexpr size_t kHeadBytes = 80;
   if (head.size() < kHeadBytes || head.compare(28, 4, "fmt ") != 0) return findings.Fail("damaged");
-  findings.Set("KOVAMDMediaTypes", "Sound");
-  findings.Set("KOVAMDCodecs", "DSD");
+  findings.Set(field::kKOVAMDMediaTypes, "Sound");
+  findings.Set(field::kKOVAMDCodecs, "DSD");
   const uint64_t channels = LittleEndian(head, 52, 4), rate = LittleEndian(head, 56, 4),
                  samples = LittleEndian(head, 64, 8);
-  if (rate > 0) findings.SetNumber("KOVAMDDurationSecond", static_cast<double>(samples) / static_cast<double>(rate));
-  findings.SetInteger("KOVAMDAudioSampleRate", static_cast<int64_t>(rate));
-  findings.SetInteger("KOVAMDAudioChannelCount", static_cast<int64_t>(channels));
-  findings.SetInteger("KOVAMDBitsPerSample", static_cast<int64_t>(LittleEndian(head, 60, 4)));
-  findings.SetInteger("KOVAMDAudioBitRate", static_cast<int64_t>(rate * channels));
+  if (rate > 0)
+    findings.SetNumber(field::kKOVAMDDurationSecond, static_cast<double>(samples) / static_cast<double>(rate));
+  findings.SetInteger(field::kKOVAMDAudioSampleRate, static_cast<int64_t>(rate));
+  findings.SetInteger(field::kKOVAMDAudioChannelCount, static_cast<int64_t>(channels));
+  findings.SetInteger(field::kKOVAMDBitsPerSample, static_cast<int64_t>(LittleEndian(head, 60, 4)));
+  findings.SetInteger(field::kKOVAMDAudioBitRate, static_cast<int64_t>(rate * channels));
   const uint64_t tag_at = LittleEndian(head, 20, 8);
   if (tag_at == 0 || tag_at >= source.size) return;
   AudioStream tag(source, tag_at, source.size, "tag.mp3");
@@ -148,7 +149,7 @@ void ReadTagged(const Source& source, Findings& findings) {
   AddTags(tags, findings);
   if (file->audioProperties() != nullptr) AddProperties(*file->audioProperties(), findings);
   AddOggLength(*file, findings);
-  findings.Set("KOVAMDCodecs", CodecOf(*file));
+  findings.Set(field::kKOVAMDCodecs, CodecOf(*file));
 }
 
 /// The library complains on standard error otherwise.

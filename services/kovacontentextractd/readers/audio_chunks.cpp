@@ -26,14 +26,14 @@ struct Sound {
 };
 
 void AddSound(const Sound& sound, Findings& findings) {
-  findings.Set("KOVAMDMediaTypes", "Sound");
-  findings.Set("KOVAMDCodecs", sound.codec);
+  findings.Set(field::kKOVAMDMediaTypes, "Sound");
+  findings.Set(field::kKOVAMDCodecs, sound.codec);
   if (!(sound.rate > 0 && sound.rate < 1e8) || sound.channels == 0 || sound.channels > 1000) return;
-  findings.SetInteger("KOVAMDAudioSampleRate", static_cast<int64_t>(sound.rate));
-  findings.SetInteger("KOVAMDAudioChannelCount", static_cast<int64_t>(sound.channels));
-  if (sound.seconds > 0) findings.SetNumber("KOVAMDDurationSecond", sound.seconds);
+  findings.SetInteger(field::kKOVAMDAudioSampleRate, static_cast<int64_t>(sound.rate));
+  findings.SetInteger(field::kKOVAMDAudioChannelCount, static_cast<int64_t>(sound.channels));
+  if (sound.seconds > 0) findings.SetNumber(field::kKOVAMDDurationSecond, sound.seconds);
   const double bits_a_second = sound.rate * static_cast<double>(sound.channels * sound.bits);
-  if (sound.bits > 0) findings.SetInteger("KOVAMDAudioBitRate", static_cast<int64_t>(bits_a_second));
+  if (sound.bits > 0) findings.SetInteger(field::kKOVAMDAudioBitRate, static_cast<int64_t>(bits_a_second));
 }
 
 /// How long that many bytes of samples play.

@@ -17,24 +17,24 @@ struct TagField {
 };
 
 constexpr TagField kTextTags[] = {
-    {"TITLE", "KOVAMDTitle"},
-    {"ALBUM", "KOVAMDAlbum"},
-    {"ARTIST", "KOVAMDAuthors"},
-    {"ALBUMARTIST", "KOVAMDAuthors"},
-    {"PERFORMER", "KOVAMDContributors"},
-    {"CONDUCTOR", "KOVAMDContributors"},
-    {"COMPOSER", "KOVAMDComposer"},
-    {"LYRICIST", "KOVAMDLyricist"},
-    {"GENRE", "KOVAMDMusicalGenre"},
-    {"COMMENT", "KOVAMDComment"},
-    {"DESCRIPTION", "KOVAMDDescription"},
-    {"COPYRIGHT", "KOVAMDCopyright"},
-    {"LABEL", "KOVAMDPublishers"},
-    {"LANGUAGE", "KOVAMDLanguages"},
-    {"INITIALKEY", "KOVAMDKeySignature"},
-    {"BPM", "KOVAMDTempo"},
-    {"ENCODING", "KOVAMDAudioEncodingApplication"},
-    {"ENCODEDBY", "KOVAMDEncodingApplications"},
+    {"TITLE", field::kKOVAMDTitle},
+    {"ALBUM", field::kKOVAMDAlbum},
+    {"ARTIST", field::kKOVAMDAuthors},
+    {"ALBUMARTIST", field::kKOVAMDAuthors},
+    {"PERFORMER", field::kKOVAMDContributors},
+    {"CONDUCTOR", field::kKOVAMDContributors},
+    {"COMPOSER", field::kKOVAMDComposer},
+    {"LYRICIST", field::kKOVAMDLyricist},
+    {"GENRE", field::kKOVAMDMusicalGenre},
+    {"COMMENT", field::kKOVAMDComment},
+    {"DESCRIPTION", field::kKOVAMDDescription},
+    {"COPYRIGHT", field::kKOVAMDCopyright},
+    {"LABEL", field::kKOVAMDPublishers},
+    {"LANGUAGE", field::kKOVAMDLanguages},
+    {"INITIALKEY", field::kKOVAMDKeySignature},
+    {"BPM", field::kKOVAMDTempo},
+    {"ENCODING", field::kKOVAMDAudioEncodingApplication},
+    {"ENCODEDBY", field::kKOVAMDEncodingApplications},
 };
 
 /// The number at the beginning of "3/12" or "2024-03-01"; 0 when there is none.
@@ -74,9 +74,9 @@ void AddTags(const TagLib::PropertyMap& tags, Findings& findings) {
     return found != tags.end() && !found->second.isEmpty() ? found->second.front().to8Bit(true) : std::string();
   };
   const int64_t track = LeadingNumber(first("TRACKNUMBER")), year = LeadingNumber(first("DATE"));
-  if (track > 0) findings.SetInteger("KOVAMDAudioTrackNumber", track);
-  if (year > 0 && year <= 9999) findings.SetInteger("KOVAMDRecordingYear", year);
-  if (const auto time = ParseTime(first("DATE"))) findings.SetInteger("KOVAMDContentCreationDate", *time);
+  if (track > 0) findings.SetInteger(field::kKOVAMDAudioTrackNumber, track);
+  if (year > 0 && year <= 9999) findings.SetInteger(field::kKOVAMDRecordingYear, year);
+  if (const auto time = ParseTime(first("DATE"))) findings.SetInteger(field::kKOVAMDContentCreationDate, *time);
   const auto words = tags.find("LYRICS");
   if (words != tags.end()) (void)findings.AddText(words->second.toString("\n").to8Bit(true));
 }

@@ -25,16 +25,16 @@ constexpr size_t kPartsMax = 20000;
 constexpr size_t kChapterMaxBytes = 4U << 20;
 
 constexpr PropertyField kPackageFields[] = {
-    {"title", "KOVAMDTitle"},
-    {"creator", "KOVAMDAuthors"},
-    {"contributor", "KOVAMDContributors"},
-    {"publisher", "KOVAMDPublishers"},
-    {"language", "KOVAMDLanguages"},
-    {"subject", "KOVAMDKeywords"},
-    {"description", "KOVAMDDescription"},
-    {"rights", "KOVAMDRights"},
-    {"identifier", "KOVAMDIdentifier"},
-    {"date", "KOVAMDContentCreationDate", PropertyField::kTime},
+    {"title", field::kKOVAMDTitle},
+    {"creator", field::kKOVAMDAuthors},
+    {"contributor", field::kKOVAMDContributors},
+    {"publisher", field::kKOVAMDPublishers},
+    {"language", field::kKOVAMDLanguages},
+    {"subject", field::kKOVAMDKeywords},
+    {"description", field::kKOVAMDDescription},
+    {"rights", field::kKOVAMDRights},
+    {"identifier", field::kKOVAMDIdentifier},
+    {"date", field::kKOVAMDContentCreationDate, PropertyField::kTime},
 };
 
 /// The member that describes the book. The container may be packed with its folder, and then is not where it must be.

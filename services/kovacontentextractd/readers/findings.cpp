@@ -6,7 +6,6 @@
 
 #include "services/kovacontentextractd/readers/reader.h"
 #include "services/kovacontentextractd/readers/utf8.h"
-#include "wire/fields.h"
 
 namespace ferrox::extract {
 
@@ -140,15 +139,15 @@ void Findings::Omit(std::string_view what) {
 
 Json::Value Findings::ToFields() const {
   Json::Value fields = fields_;
-  if (cut_) fields[fileindex::elastic::k_KOVATextCut] = true;
-  if (!omitted_.empty()) fields[fileindex::elastic::k_KOVAExtractError] = std::string(kPartlyRead) + omitted_;
-  if (!failure_.empty()) fields[fileindex::elastic::k_KOVAExtractError] = failure_;
+  if (cut_) fields[field::k_KOVATextCut] = true;
+  if (!omitted_.empty()) fields[field::k_KOVAExtractError] = std::string(kPartlyRead) + omitted_;
+  if (!failure_.empty()) fields[field::k_KOVAExtractError] = failure_;
   return fields;
 }
 
 Json::Value Findings::ToDocument() const {
   Json::Value document = ToFields();
-  if (!text_.empty()) document[fileindex::elastic::kKOVAMDTextContent] = text_;
+  if (!text_.empty()) document[field::kKOVAMDTextContent] = text_;
   return document;
 }
 

@@ -91,18 +91,18 @@ class MailReader {
   /// People, and of a single message its subject, date and the like.
   void AddHeader(GMimeMessage* message) {
     encoding_ = TrueEncoding(View(g_mime_message_get_subject(message)));
-    AddPeople(message, GMIME_ADDRESS_TYPE_FROM, "KOVAMDAuthors", "KOVAMDAuthorAddresses");
-    AddPeople(message, GMIME_ADDRESS_TYPE_TO, "KOVAMDRecipients", "KOVAMDRecipientAddresses");
-    AddPeople(message, GMIME_ADDRESS_TYPE_CC, "KOVAMDRecipients", "KOVAMDRecipientAddresses");
+    AddPeople(message, GMIME_ADDRESS_TYPE_FROM, field::kKOVAMDAuthors, field::kKOVAMDAuthorAddresses);
+    AddPeople(message, GMIME_ADDRESS_TYPE_TO, field::kKOVAMDRecipients, field::kKOVAMDRecipientAddresses);
+    AddPeople(message, GMIME_ADDRESS_TYPE_CC, field::kKOVAMDRecipients, field::kKOVAMDRecipientAddresses);
     if (is_box_) return;  // what is one message's
-    findings_.Set("KOVAMDTitle", HeaderText(g_mime_message_get_subject(message)));
-    findings_.Set("KOVAMDIdentifier", View(g_mime_message_get_message_id(message)));
+    findings_.Set(field::kKOVAMDTitle, HeaderText(g_mime_message_get_subject(message)));
+    findings_.Set(field::kKOVAMDIdentifier, View(g_mime_message_get_message_id(message)));
     GMimeObject* headers = GMIME_OBJECT(message);
-    findings_.Set("KOVAMDEncodingApplications", View(g_mime_object_get_header(headers, "User-Agent")));
-    findings_.Set("KOVAMDEncodingApplications", View(g_mime_object_get_header(headers, "X-Mailer")));
-    findings_.Set("KOVAMDKeywords", View(g_mime_object_get_header(headers, "Keywords")));
+    findings_.Set(field::kKOVAMDEncodingApplications, View(g_mime_object_get_header(headers, "User-Agent")));
+    findings_.Set(field::kKOVAMDEncodingApplications, View(g_mime_object_get_header(headers, "X-Mailer")));
+    findings_.Set(field::kKOVAMDKeywords, View(g_mime_object_get_header(headers, "Keywords")));
     GDateTime* date = g_mime_message_get_date(message);
-    if (date != nullptr) findings_.SetInteger("KOVAMDContentCreationDate", g_date_time_to_unix(date));
+    if (date != nullptr) findings_.SetInteger(field::kKOVAMDContentCreationDate, g_date_time_to_unix(date));
   }
 
   /// A header's text, in the encoding that the message's subject has without saying so.

@@ -38,27 +38,27 @@ std::string RelationsOf(std::string_view part) {
 
 // docProps/core.xml: Dublin Core and what the authors set.
 constexpr PropertyField kCoreFields[] = {
-    {"title", "KOVAMDTitle"},
-    {"creator", "KOVAMDAuthors", PropertyField::kSemicolonList},
-    {"lastModifiedBy", "KOVAMDContributors"},
-    {"keywords", "KOVAMDKeywords"},
-    {"category", "KOVAMDKeywords"},
-    {"description", "KOVAMDComment"},
-    {"subject", "KOVAMDDescription"},
-    {"language", "KOVAMDLanguages"},
-    {"version", "KOVAMDVersion"},
-    {"identifier", "KOVAMDIdentifier"},
-    {"created", "KOVAMDContentCreationDate", PropertyField::kTime},
-    {"modified", "KOVAMDContentModificationDate", PropertyField::kTime},
+    {"title", field::kKOVAMDTitle},
+    {"creator", field::kKOVAMDAuthors, PropertyField::kSemicolonList},
+    {"lastModifiedBy", field::kKOVAMDContributors},
+    {"keywords", field::kKOVAMDKeywords},
+    {"category", field::kKOVAMDKeywords},
+    {"description", field::kKOVAMDComment},
+    {"subject", field::kKOVAMDDescription},
+    {"language", field::kKOVAMDLanguages},
+    {"version", field::kKOVAMDVersion},
+    {"identifier", field::kKOVAMDIdentifier},
+    {"created", field::kKOVAMDContentCreationDate, PropertyField::kTime},
+    {"modified", field::kKOVAMDContentModificationDate, PropertyField::kTime},
 };
 
 // docProps/app.xml: what the program wrote.
 constexpr PropertyField kApplicationFields[] = {
-    {"Application", "KOVAMDCreator"},
-    {"Application", "KOVAMDEncodingApplications"},
-    {"Company", "KOVAMDOrganizations"},
-    {"Pages", "KOVAMDNumberOfPages", PropertyField::kCount},
-    {"Slides", "KOVAMDNumberOfPages", PropertyField::kCount},
+    {"Application", field::kKOVAMDCreator},
+    {"Application", field::kKOVAMDEncodingApplications},
+    {"Company", field::kKOVAMDOrganizations},
+    {"Pages", field::kKOVAMDNumberOfPages, PropertyField::kCount},
+    {"Slides", field::kKOVAMDNumberOfPages, PropertyField::kCount},
 };
 
 /// What the writer says a picture shows. It may stand in the midst of a word.

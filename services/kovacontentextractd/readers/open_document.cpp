@@ -22,17 +22,17 @@ using Token = XmlTokenizer::Token;
 // Embedded objects are folders with a content.xml of their own.
 
 constexpr PropertyField kMetaFields[] = {
-    {"title", "KOVAMDTitle"},
-    {"initial-creator", "KOVAMDAuthors"},
-    {"creator", "KOVAMDContributors"},
-    {"keyword", "KOVAMDKeywords"},
-    {"description", "KOVAMDComment"},
-    {"subject", "KOVAMDDescription"},
-    {"language", "KOVAMDLanguages"},
-    {"generator", "KOVAMDCreator"},
-    {"generator", "KOVAMDEncodingApplications"},
-    {"creation-date", "KOVAMDContentCreationDate", PropertyField::kTime},
-    {"date", "KOVAMDContentModificationDate", PropertyField::kTime},
+    {"title", field::kKOVAMDTitle},
+    {"initial-creator", field::kKOVAMDAuthors},
+    {"creator", field::kKOVAMDContributors},
+    {"keyword", field::kKOVAMDKeywords},
+    {"description", field::kKOVAMDComment},
+    {"subject", field::kKOVAMDDescription},
+    {"language", field::kKOVAMDLanguages},
+    {"generator", field::kKOVAMDCreator},
+    {"generator", field::kKOVAMDEncodingApplications},
+    {"creation-date", field::kKOVAMDContentCreationDate, PropertyField::kTime},
+    {"date", field::kKOVAMDContentModificationDate, PropertyField::kTime},
 };
 
 /// The number of pages stands in an attribute.
@@ -40,7 +40,8 @@ void AddPageCount(ByteSource& meta, Findings& findings) {
   XmlTokenizer xml(meta);
   for (Token token; xml.Next(token);) {
     if (token != Token::kOpen || xml.Name() != "document-statistic") continue;
-    SetProperty({"", "KOVAMDNumberOfPages", PropertyField::kCount}, xml.PrefixedAttribute("page-count"), findings);
+    SetProperty({"", field::kKOVAMDNumberOfPages, PropertyField::kCount}, xml.PrefixedAttribute("page-count"),
+                findings);
   }
 }
 

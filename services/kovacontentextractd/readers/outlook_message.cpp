@@ -39,7 +39,7 @@ void AddSendTime(const CompoundFile& file, Findings& findings) {
   for (size_t at = kHeaderBytes; at + kEntryBytes <= table.size(); at += kEntryBytes) {
     if (Little32(table, at) != kSent) continue;
     if (const auto seconds = FromFileTime(LittleEndian(table, at + 8, 8))) {
-      findings.SetInteger("KOVAMDContentCreationDate", *seconds);
+      findings.SetInteger(field::kKOVAMDContentCreationDate, *seconds);
     }
   }
 }
@@ -49,7 +49,7 @@ void AddRecipientAddresses(const CompoundFile& file, Findings& findings) {
   for (const uint32_t recipient : file.Storages("__recip_version1.0")) {
     std::string address = TextOf(file, "39FE", recipient);
     if (address.empty()) address = TextOf(file, "3003", recipient);
-    if (address.find('@') != std::string::npos) findings.Append("KOVAMDRecipientAddresses", address);
+    if (address.find('@') != std::string::npos) findings.Append(field::kKOVAMDRecipientAddresses, address);
   }
 }
 
@@ -74,11 +74,11 @@ void AddAttachments(const CompoundFile& file, Findings& findings) {
 }  // namespace
 
 void ReadOutlookMessage(const CompoundFile& file, Findings& findings) {
-  findings.Set("KOVAMDTitle", TextOf(file, "0037"));
-  findings.Append("KOVAMDAuthors", TextOf(file, "0C1A"));
-  findings.Append("KOVAMDAuthorAddresses", TextOf(file, "5D01"));
-  findings.Append("KOVAMDRecipients", TextOf(file, "0E04"));
-  findings.Append("KOVAMDRecipients", TextOf(file, "0E03"));
+  findings.Set(field::kKOVAMDTitle, TextOf(file, "0037"));
+  findings.Append(field::kKOVAMDAuthors, TextOf(file, "0C1A"));
+  findings.Append(field::kKOVAMDAuthorAddresses, TextOf(file, "5D01"));
+  findings.Append(field::kKOVAMDRecipients, TextOf(file, "0E04"));
+  findings.Append(field::kKOVAMDRecipients, TextOf(file, "0E03"));
   std::string body = TextOf(file, "1000");
   const auto html = body.empty() ? file.Open("__substg1.0_10130102") : nullptr;
   DecodedText decoded;

@@ -33,7 +33,7 @@ std::vector<std::string> SlideIds(ZipContainer& zip, const std::string& part) {
 void ReadPresentation(ZipContainer& zip, const std::string& part, Findings& findings) {
   const std::vector<Relation> relations = ReadRelations(zip, part);
   const std::vector<std::string> ids = SlideIds(zip, part);
-  if (!ids.empty()) findings.SetInteger("KOVAMDNumberOfPages", static_cast<int64_t>(ids.size()));
+  if (!ids.empty()) findings.SetInteger(field::kKOVAMDNumberOfPages, static_cast<int64_t>(ids.size()));
   std::map<std::string, std::string> targets = TargetsById(relations);
   for (const std::string& id : ids) {
     const std::string& slide = targets[id];

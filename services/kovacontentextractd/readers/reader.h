@@ -8,6 +8,8 @@
 
 #include <json/value.h>
 
+#include "wire/fields.h"
+
 /// Readers get text and metadata out of one file. They run in a worker without file system and without rights: all they
 /// have is the open file. They may be given anything, and must not trust a byte of it; what the kernel enforces on the
 /// worker (memory, time) is the last line, not the first.
@@ -17,6 +19,9 @@
 /// far as it can and says in the findings what stopped it; it keeps a bound of its own on all that a file can make
 /// long: depth, numbers of things, bytes unpacked, time.
 namespace ferrox::extract {
+
+/// The fields that findings fill, by the names of the index schema: field::kKOVAMDTitle.
+namespace field = fileindex::elastic;
 
 /// What bounds every reader.
 struct Limits {
@@ -61,8 +66,9 @@ class Findings {
   /// Ends a line, paragraph, cell or page: the words before and behind do not touch.
   void Break();
 
-  /// Metadata, by the names and types of the index schema. An empty text, and what is not finite, is not set. Set
-  /// replaces; Append joins several values of one field (authors, keywords) with ", ", each once.
+  /// Metadata: one of the fields above, with the type that the index schema gives it. An empty text, and what is not
+  /// finite, is not set. Set replaces; Append joins several values of one field (authors, keywords) with ", ", each
+  /// once.
   void Set(const char* field, std::string_view value);
   void Append(const char* field, std::string_view value);
   void SetInteger(const char* field, int64_t value);

@@ -57,15 +57,15 @@ struct NamedTarget {
 
 constexpr NamedTarget kTargets[] = {
     {"fonttbl", Target::kFontTable},
-    {"title", Target::kField, "KOVAMDTitle"},
-    {"subject", Target::kField, "KOVAMDDescription"},
-    {"author", Target::kField, "KOVAMDAuthors"},
-    {"operator", Target::kField, "KOVAMDContributors"},
-    {"keywords", Target::kField, "KOVAMDKeywords"},
-    {"category", Target::kField, "KOVAMDKeywords"},
-    {"doccomm", Target::kField, "KOVAMDComment"},
-    {"company", Target::kField, "KOVAMDOrganizations"},
-    {"generator", Target::kField, "KOVAMDCreator"},
+    {"title", Target::kField, field::kKOVAMDTitle},
+    {"subject", Target::kField, field::kKOVAMDDescription},
+    {"author", Target::kField, field::kKOVAMDAuthors},
+    {"operator", Target::kField, field::kKOVAMDContributors},
+    {"keywords", Target::kField, field::kKOVAMDKeywords},
+    {"category", Target::kField, field::kKOVAMDKeywords},
+    {"doccomm", Target::kField, field::kKOVAMDComment},
+    {"company", Target::kField, field::kKOVAMDOrganizations},
+    {"generator", Target::kField, field::kKOVAMDCreator},
     {"info", Target::kNowhere},
     {"colortbl", Target::kNowhere},
     {"stylesheet", Target::kNowhere},
@@ -309,7 +309,7 @@ class RichTextReader {
       return value;
     };
     time = {number("\\yr"), number("\\mo"), number("\\dy"), number("\\hr"), number("\\min"), 0};
-    if (const auto seconds = ToSeconds(time)) findings_.SetInteger("KOVAMDContentCreationDate", *seconds);
+    if (const auto seconds = ToSeconds(time)) findings_.SetInteger(field::kKOVAMDContentCreationDate, *seconds);
   }
 
   /// "\bin": so many bytes of a picture follow as they are, braces among them.

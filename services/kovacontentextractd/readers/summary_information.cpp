@@ -26,22 +26,22 @@ struct Property {
 };
 
 constexpr Property kSummary[] = {
-    {2, "KOVAMDTitle"},
-    {3, "KOVAMDDescription"},
-    {4, "KOVAMDAuthors"},
-    {5, "KOVAMDKeywords"},
-    {6, "KOVAMDComment"},
-    {8, "KOVAMDContributors"},
-    {12, "KOVAMDContentCreationDate"},
-    {13, "KOVAMDContentModificationDate"},
-    {14, "KOVAMDNumberOfPages"},
-    {18, "KOVAMDCreator"},
-    {18, "KOVAMDEncodingApplications"},
+    {2, field::kKOVAMDTitle},
+    {3, field::kKOVAMDDescription},
+    {4, field::kKOVAMDAuthors},
+    {5, field::kKOVAMDKeywords},
+    {6, field::kKOVAMDComment},
+    {8, field::kKOVAMDContributors},
+    {12, field::kKOVAMDContentCreationDate},
+    {13, field::kKOVAMDContentModificationDate},
+    {14, field::kKOVAMDNumberOfPages},
+    {18, field::kKOVAMDCreator},
+    {18, field::kKOVAMDEncodingApplications},
 };
 constexpr Property kDocumentSummary[] = {
-    {2, "KOVAMDKeywords"},
-    {7, "KOVAMDNumberOfPages"},
-    {15, "KOVAMDOrganizations"},
+    {2, field::kKOVAMDKeywords},
+    {7, field::kKOVAMDNumberOfPages},
+    {15, field::kKOVAMDOrganizations},
 };
 
 /// Sets one field from the value at `at`: its type, then what the type has.

@@ -56,12 +56,12 @@ std::string DeclaresNothing(std::string_view) { return {}; }
 bool AddDecoded(const Head& head, DeclaredEncoding declared, Markup markup, Findings& findings) {
   DecodedText decoded;
   if (!Decode(head.bytes, head.cut, declared(head.bytes), decoded)) return false;
-  findings.Set("_KOVATextEncoding", decoded.encoding);
+  findings.Set(field::k_KOVATextEncoding, decoded.encoding);
   if (markup == nullptr) {
     findings.AddText(decoded.text);
   } else {
     const MarkupText read = markup(decoded.text, findings.Bounds().text_bytes);
-    findings.Set("KOVAMDTitle", read.title);
+    findings.Set(field::kKOVAMDTitle, read.title);
     findings.AddText(read.text);
     if (read.cut) findings.MarkCut();
   }
@@ -102,9 +102,10 @@ void ReadUnknownFile(const Source& source, Findings& findings) {
   Head head;
   if (!ReadHead(source, kReadMaxBytes, head)) return findings.Fail("cannot be read");
   if (head.bytes.empty()) return;
-  if (AddDecoded(head, &DeclaresNothing, nullptr, findings)) return findings.Set("KOVAMDContentType", "text/plain");
+  if (AddDecoded(head, &DeclaresNothing, nullptr, findings))
+    return findings.Set(field::kKOVAMDContentType, "text/plain");
   const std::string type = TypeByMagic(head.bytes);
-  findings.Set("KOVAMDContentType", type.empty() ? "application/octet-stream" : type);
+  findings.Set(field::kKOVAMDContentType, type.empty() ? "application/octet-stream" : type);
   if (type.empty()) findings.Fail("not text");
 }
 

@@ -61,19 +61,19 @@ void AddTime(const char* field, std::string text, Findings& findings) {
 /// The document's own properties count more than those of its packet of XMP, which is read first.
 void AddInformation(const poppler::document& document, Findings& findings) {
   AddXmpPacket(Packet(document.metadata()), findings);
-  findings.Set("KOVAMDTitle", Utf8(document.get_title()));
-  findings.Set("KOVAMDAuthors", Utf8(document.get_author()));
-  findings.Set("KOVAMDDescription", Utf8(document.get_subject()));
-  findings.Set("KOVAMDKeywords", Utf8(document.get_keywords()));
-  findings.Set("KOVAMDCreator", Utf8(document.get_creator()));
-  findings.Set("KOVAMDEncodingApplications", Utf8(document.get_producer()));
-  AddTime("KOVAMDContentCreationDate", Utf8(document.info_key("CreationDate")), findings);
-  AddTime("KOVAMDContentModificationDate", Utf8(document.info_key("ModDate")), findings);
-  findings.SetInteger("KOVAMDNumberOfPages", document.pages());
+  findings.Set(field::kKOVAMDTitle, Utf8(document.get_title()));
+  findings.Set(field::kKOVAMDAuthors, Utf8(document.get_author()));
+  findings.Set(field::kKOVAMDDescription, Utf8(document.get_subject()));
+  findings.Set(field::kKOVAMDKeywords, Utf8(document.get_keywords()));
+  findings.Set(field::kKOVAMDCreator, Utf8(document.get_creator()));
+  findings.Set(field::kKOVAMDEncodingApplications, Utf8(document.get_producer()));
+  AddTime(field::kKOVAMDContentCreationDate, Utf8(document.info_key("CreationDate")), findings);
+  AddTime(field::kKOVAMDContentModificationDate, Utf8(document.info_key("ModDate")), findings);
+  findings.SetInteger(field::kKOVAMDNumberOfPages, document.pages());
   int major = 0, minor = 0;
   document.get_pdf_version(&major, &minor);
-  findings.Set("KOVAMDVersion", std::to_string(major) + "." + std::to_string(minor));
-  if (document.is_encrypted()) findings.Set("KOVAMDSecurityMethod", "Password Encrypted");
+  findings.Set(field::kKOVAMDVersion, std::to_string(major) + "." + std::to_string(minor));
+  if (document.is_encrypted()) findings.Set(field::kKOVAMDSecurityMethod, "Password Encrypted");
 }
 
 /// The text of all pages, and the size of the first one in points.
@@ -89,8 +89,8 @@ void AddPages(const poppler::document& document, Findings& findings) {
     }
     if (i == 0) {
       const poppler::rectf size = page->page_rect();
-      findings.SetNumber("KOVAMDPageWidth", size.width());
-      findings.SetNumber("KOVAMDPageHeight", size.height());
+      findings.SetNumber(field::kKOVAMDPageWidth, size.width());
+      findings.SetNumber(field::kKOVAMDPageHeight, size.height());
     }
     if (!findings.AddText(Utf8(page->text({}, poppler::page::non_raw_non_physical_layout)))) return;
     findings.Break();

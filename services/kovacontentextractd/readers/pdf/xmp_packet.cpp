@@ -10,9 +10,13 @@ namespace {
 using Token = XmlTokenizer::Token;
 
 constexpr PropertyField kFields[] = {
-    {"title", "KOVAMDTitle"},        {"creator", "KOVAMDAuthors"}, {"description", "KOVAMDDescription"},
-    {"subject", "KOVAMDKeywords"},   {"rights", "KOVAMDRights"},   {"publisher", "KOVAMDPublishers"},
-    {"language", "KOVAMDLanguages"},
+    {"title", field::kKOVAMDTitle},
+    {"creator", field::kKOVAMDAuthors},
+    {"description", field::kKOVAMDDescription},
+    {"subject", field::kKOVAMDKeywords},
+    {"rights", field::kKOVAMDRights},
+    {"publisher", field::kKOVAMDPublishers},
+    {"language", field::kKOVAMDLanguages},
 };
 
 /// A packet in memory.

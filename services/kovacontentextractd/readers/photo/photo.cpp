@@ -32,75 +32,75 @@ struct Row {
 
 // Of several rows for a field that is no list, the first one that the file has counts.
 constexpr Row kExifRows[] = {
-    {"Exif.Image.Make", "KOVAMDAcquisitionMake"},
-    {"Exif.Image.Model", "KOVAMDAcquisitionModel"},
-    {"Exif.Image.UniqueCameraModel", "KOVAMDAcquisitionModel"},
-    {"Exif.Image.Software", "KOVAMDCreator"},
-    {"Exif.Image.ImageDescription", "KOVAMDDescription"},
-    {"Exif.Image.Copyright", "KOVAMDCopyright"},
-    {"Exif.Image.Artist", "KOVAMDAuthors"},
-    {"Exif.Image.Orientation", "KOVAMDOrientation", Kind::kInteger},
-    {"Exif.Image.XPTitle", "KOVAMDTitle", Kind::kShown},
-    {"Exif.Image.XPComment", "KOVAMDComment", Kind::kShown},
-    {"Exif.Image.XPKeywords", "KOVAMDKeywords", Kind::kShown},
-    {"Exif.Image.XPAuthor", "KOVAMDAuthors", Kind::kShown},
-    {"Exif.Image.Rating", "KOVAMDStarRating", Kind::kShown},
-    {"Exif.Photo.UserComment", "KOVAMDComment"},
-    {"Exif.Photo.ExposureTime", "KOVAMDExposureTimeSeconds", Kind::kNumber},
-    {"Exif.Photo.FNumber", "KOVAMDFNumber", Kind::kNumber},
-    {"Exif.Photo.FNumber", "KOVAMDAperture", Kind::kShown},
-    {"Exif.Photo.MaxApertureValue", "KOVAMDMaxAperture", Kind::kNumber},
-    {"Exif.Photo.FocalLength", "KOVAMDFocalLength", Kind::kNumber},
-    {"Exif.Photo.ExposureProgram", "KOVAMDExposureProgram", Kind::kShown},
-    {"Exif.Photo.ExposureMode", "KOVAMDExposureMode", Kind::kShown},
-    {"Exif.Photo.MeteringMode", "KOVAMDMeteringMode", Kind::kShown},
-    {"Exif.Photo.WhiteBalance", "KOVAMDWhiteBalance", Kind::kShown},
-    {"Exif.Photo.ColorSpace", "KOVAMDColorSpace", Kind::kShown},
-    {"Exif.Photo.ExifVersion", "KOVAMDEXIFVersion", Kind::kShown},
-    {"Exif.Image.BitsPerSample", "KOVAMDBitsPerSample", Kind::kInteger},
+    {"Exif.Image.Make", field::kKOVAMDAcquisitionMake},
+    {"Exif.Image.Model", field::kKOVAMDAcquisitionModel},
+    {"Exif.Image.UniqueCameraModel", field::kKOVAMDAcquisitionModel},
+    {"Exif.Image.Software", field::kKOVAMDCreator},
+    {"Exif.Image.ImageDescription", field::kKOVAMDDescription},
+    {"Exif.Image.Copyright", field::kKOVAMDCopyright},
+    {"Exif.Image.Artist", field::kKOVAMDAuthors},
+    {"Exif.Image.Orientation", field::kKOVAMDOrientation, Kind::kInteger},
+    {"Exif.Image.XPTitle", field::kKOVAMDTitle, Kind::kShown},
+    {"Exif.Image.XPComment", field::kKOVAMDComment, Kind::kShown},
+    {"Exif.Image.XPKeywords", field::kKOVAMDKeywords, Kind::kShown},
+    {"Exif.Image.XPAuthor", field::kKOVAMDAuthors, Kind::kShown},
+    {"Exif.Image.Rating", field::kKOVAMDStarRating, Kind::kShown},
+    {"Exif.Photo.UserComment", field::kKOVAMDComment},
+    {"Exif.Photo.ExposureTime", field::kKOVAMDExposureTimeSeconds, Kind::kNumber},
+    {"Exif.Photo.FNumber", field::kKOVAMDFNumber, Kind::kNumber},
+    {"Exif.Photo.FNumber", field::kKOVAMDAperture, Kind::kShown},
+    {"Exif.Photo.MaxApertureValue", field::kKOVAMDMaxAperture, Kind::kNumber},
+    {"Exif.Photo.FocalLength", field::kKOVAMDFocalLength, Kind::kNumber},
+    {"Exif.Photo.ExposureProgram", field::kKOVAMDExposureProgram, Kind::kShown},
+    {"Exif.Photo.ExposureMode", field::kKOVAMDExposureMode, Kind::kShown},
+    {"Exif.Photo.MeteringMode", field::kKOVAMDMeteringMode, Kind::kShown},
+    {"Exif.Photo.WhiteBalance", field::kKOVAMDWhiteBalance, Kind::kShown},
+    {"Exif.Photo.ColorSpace", field::kKOVAMDColorSpace, Kind::kShown},
+    {"Exif.Photo.ExifVersion", field::kKOVAMDEXIFVersion, Kind::kShown},
+    {"Exif.Image.BitsPerSample", field::kKOVAMDBitsPerSample, Kind::kInteger},
 };
 
 constexpr Row kIptcRows[] = {
-    {"Iptc.Application2.ObjectName", "KOVAMDTitle"},
-    {"Iptc.Application2.Headline", "KOVAMDHeadline"},
-    {"Iptc.Application2.Caption", "KOVAMDDescription"},
-    {"Iptc.Application2.Keywords", "KOVAMDKeywords"},
-    {"Iptc.Application2.Byline", "KOVAMDAuthors"},
-    {"Iptc.Application2.Copyright", "KOVAMDCopyright"},
-    {"Iptc.Application2.SpecialInstructions", "KOVAMDInstructions"},
-    {"Iptc.Application2.SubLocation", "KOVAMDNamedLocation"},
-    {"Iptc.Application2.City", "KOVAMDCity"},
-    {"Iptc.Application2.ProvinceState", "KOVAStateOrProvince"},
-    {"Iptc.Application2.CountryName", "KOVAMDCountry"},
+    {"Iptc.Application2.ObjectName", field::kKOVAMDTitle},
+    {"Iptc.Application2.Headline", field::kKOVAMDHeadline},
+    {"Iptc.Application2.Caption", field::kKOVAMDDescription},
+    {"Iptc.Application2.Keywords", field::kKOVAMDKeywords},
+    {"Iptc.Application2.Byline", field::kKOVAMDAuthors},
+    {"Iptc.Application2.Copyright", field::kKOVAMDCopyright},
+    {"Iptc.Application2.SpecialInstructions", field::kKOVAMDInstructions},
+    {"Iptc.Application2.SubLocation", field::kKOVAMDNamedLocation},
+    {"Iptc.Application2.City", field::kKOVAMDCity},
+    {"Iptc.Application2.ProvinceState", field::kKOVAStateOrProvince},
+    {"Iptc.Application2.CountryName", field::kKOVAMDCountry},
 };
 
 constexpr Row kXmpRows[] = {
-    {"Xmp.dc.title", "KOVAMDTitle"},
-    {"Xmp.photoshop.Headline", "KOVAMDHeadline"},
-    {"Xmp.dc.description", "KOVAMDDescription"},
-    {"Xmp.dc.subject", "KOVAMDKeywords"},
-    {"Xmp.dc.creator", "KOVAMDAuthors"},
-    {"Xmp.dc.rights", "KOVAMDCopyright"},
-    {"Xmp.photoshop.Instructions", "KOVAMDInstructions"},
-    {"Xmp.iptc.Location", "KOVAMDNamedLocation"},
-    {"Xmp.photoshop.City", "KOVAMDCity"},
-    {"Xmp.photoshop.State", "KOVAStateOrProvince"},
-    {"Xmp.photoshop.Country", "KOVAMDCountry"},
-    {"Xmp.iptcExt.PersonInImage", "KOVAMDPeopleDisplayName"},
-    {"Xmp.xmp.Rating", "KOVAMDStarRating"},
-    {"Xmp.xmp.CreatorTool", "KOVAMDCreator"},
+    {"Xmp.dc.title", field::kKOVAMDTitle},
+    {"Xmp.photoshop.Headline", field::kKOVAMDHeadline},
+    {"Xmp.dc.description", field::kKOVAMDDescription},
+    {"Xmp.dc.subject", field::kKOVAMDKeywords},
+    {"Xmp.dc.creator", field::kKOVAMDAuthors},
+    {"Xmp.dc.rights", field::kKOVAMDCopyright},
+    {"Xmp.photoshop.Instructions", field::kKOVAMDInstructions},
+    {"Xmp.iptc.Location", field::kKOVAMDNamedLocation},
+    {"Xmp.photoshop.City", field::kKOVAMDCity},
+    {"Xmp.photoshop.State", field::kKOVAStateOrProvince},
+    {"Xmp.photoshop.Country", field::kKOVAMDCountry},
+    {"Xmp.iptcExt.PersonInImage", field::kKOVAMDPeopleDisplayName},
+    {"Xmp.xmp.Rating", field::kKOVAMDStarRating},
+    {"Xmp.xmp.CreatorTool", field::kKOVAMDCreator},
 };
 
 /// What programs copy out of EXIF, and in some files is all that is left of it.
 constexpr Row kCopiedRows[] = {
-    {"Xmp.tiff.Make", "KOVAMDAcquisitionMake"},
-    {"Xmp.tiff.Model", "KOVAMDAcquisitionModel"},
-    {"Xmp.exif.UserComment", "KOVAMDComment"},
+    {"Xmp.tiff.Make", field::kKOVAMDAcquisitionMake},
+    {"Xmp.tiff.Model", field::kKOVAMDAcquisitionModel},
+    {"Xmp.exif.UserComment", field::kKOVAMDComment},
 };
 
 /// Fields of several values, to which each source adds.
-bool IsList(const std::string& field) {
-  return field == "KOVAMDKeywords" || field == "KOVAMDAuthors" || field == "KOVAMDPeopleDisplayName";
+bool IsList(const std::string& name) {
+  return name == field::kKOVAMDKeywords || name == field::kKOVAMDAuthors || name == field::kKOVAMDPeopleDisplayName;
 }
 
 /// Collects fields so that of several sources the first one counts, and lists are joined.
@@ -210,10 +210,10 @@ void AddTimes(const Exiv2::Image& image, Findings& findings) {
         TextOf(xmp, "Xmp.xmp.CreateDate"), changed}) {
     const auto taken = ParseTime(text);
     if (!taken.has_value()) continue;
-    findings.SetInteger("KOVAMDContentCreationDate", *taken);
+    findings.SetInteger(field::kKOVAMDContentCreationDate, *taken);
     break;
   }
-  if (const auto time = ParseTime(changed)) findings.SetInteger("KOVAMDContentModificationDate", *time);
+  if (const auto time = ParseTime(changed)) findings.SetInteger(field::kKOVAMDContentModificationDate, *time);
 }
 
 /// Exposures are shown as photographers write them: "1/250", "2".
@@ -222,17 +222,17 @@ void AddExposure(const Exiv2::ExifData& exif, Findings& findings) {
   if (found != exif.end() && found->count() > 0) {
     const double seconds = NumberOf(*found);
     if (seconds > 0 && seconds < 1) {
-      findings.Set("KOVAMDExposureTimeString", "1/" + std::to_string(std::llround(std::min(1 / seconds, 1e9))));
+      findings.Set(field::kKOVAMDExposureTimeString, "1/" + std::to_string(std::llround(std::min(1 / seconds, 1e9))));
     } else if (seconds >= 1 && seconds < 1e9) {
-      findings.Set("KOVAMDExposureTimeString", std::to_string(std::llround(seconds)));
+      findings.Set(field::kKOVAMDExposureTimeString, std::to_string(std::llround(seconds)));
     }
   }
   const auto speed = Exiv2::isoSpeed(exif);  // of some cameras, only what the maker adds has it
   if (speed != exif.end() && speed->count() > 0 && speed->toLong() > 0) {
-    findings.SetInteger("KOVAMDISOSpeed", speed->toLong());
+    findings.SetInteger(field::kKOVAMDISOSpeed, speed->toLong());
   }
   const auto flash = exif.findKey(Exiv2::ExifKey("Exif.Photo.Flash"));
-  if (flash != exif.end() && flash->count() > 0) findings.SetInteger("KOVAMDFlashOnOff", flash->toLong() & 1);
+  if (flash != exif.end() && flash->count() > 0) findings.SetInteger(field::kKOVAMDFlashOnOff, flash->toLong() & 1);
 }
 
 /// In dots for an inch; unit 3 means dots for a centimetre.
@@ -245,16 +245,16 @@ void AddResolution(const Exiv2::ExifData& exif, Findings& findings) {
     const float value = found->toFloat() * inches;
     if (value > 0 && value < 1e6F) findings.SetInteger(field, std::lround(value));
   };
-  add("Exif.Image.XResolution", "KOVAMDResolutionWidthDPI");
-  add("Exif.Image.YResolution", "KOVAMDResolutionHeightDPI");
+  add("Exif.Image.XResolution", field::kKOVAMDResolutionWidthDPI);
+  add("Exif.Image.YResolution", field::kKOVAMDResolutionHeightDPI);
 }
 
 void AddPixels(const Exiv2::Image& image, Findings& findings) {
   const int64_t width = image.pixelWidth(), height = image.pixelHeight();
   if (width <= 0 || height <= 0) return;
-  findings.SetInteger("KOVAMDPixelWidth", width);
-  findings.SetInteger("KOVAMDPixelHeight", height);
-  findings.SetInteger("KOVAMDPixelCount", width * height);
+  findings.SetInteger(field::kKOVAMDPixelWidth, width);
+  findings.SetInteger(field::kKOVAMDPixelHeight, height);
+  findings.SetInteger(field::kKOVAMDPixelCount, width * height);
 }
 
 /// Names that programs give faces, and places that they write in several parts.
@@ -264,12 +264,12 @@ void AddNamedParts(const Exiv2::XmpData& xmp, Fields& fields) {
     const char* end;
     const char* field;
   } kParts[] = {
-      {"Xmp.mwg-rs.Regions/", "/mwg-rs:Name", "KOVAMDPeopleDisplayName"},
-      {"Xmp.MP.RegionInfo/", "/MPReg:PersonDisplayName", "KOVAMDPeopleDisplayName"},
-      {"Xmp.iptcExt.LocationCreated", "/Iptc4xmpExt:Sublocation", "KOVAMDNamedLocation"},
-      {"Xmp.iptcExt.LocationCreated", "/Iptc4xmpExt:City", "KOVAMDCity"},
-      {"Xmp.iptcExt.LocationCreated", "/Iptc4xmpExt:ProvinceState", "KOVAStateOrProvince"},
-      {"Xmp.iptcExt.LocationCreated", "/Iptc4xmpExt:CountryName", "KOVAMDCountry"},
+      {"Xmp.mwg-rs.Regions/", "/mwg-rs:Name", field::kKOVAMDPeopleDisplayName},
+      {"Xmp.MP.RegionInfo/", "/MPReg:PersonDisplayName", field::kKOVAMDPeopleDisplayName},
+      {"Xmp.iptcExt.LocationCreated", "/Iptc4xmpExt:Sublocation", field::kKOVAMDNamedLocation},
+      {"Xmp.iptcExt.LocationCreated", "/Iptc4xmpExt:City", field::kKOVAMDCity},
+      {"Xmp.iptcExt.LocationCreated", "/Iptc4xmpExt:ProvinceState", field::kKOVAStateOrProvince},
+      {"Xmp.iptcExt.LocationCreated", "/Iptc4xmpExt:CountryName", field::kKOVAMDCountry},
   };
   for (const auto& datum : xmp) {
     const std::string key = datum.key();
@@ -282,17 +282,18 @@ void AddNamedParts(const Exiv2::XmpData& xmp, Fields& fields) {
 /// The names of the place together, from the nearest to the widest.
 void AddPlace(const Fields& fields, Findings& findings) {
   std::string place;
-  for (const char* field : {"KOVAMDNamedLocation", "KOVAMDCity", "KOVAStateOrProvince", "KOVAMDCountry"}) {
-    const std::string name = fields.Value(field);
+  for (const char* part :
+       {field::kKOVAMDNamedLocation, field::kKOVAMDCity, field::kKOVAStateOrProvince, field::kKOVAMDCountry}) {
+    const std::string name = fields.Value(part);
     if (!name.empty()) place += (place.empty() ? "" : ", ") + name;
   }
-  findings.Set("KOVAMDNamedLocation", place);
+  findings.Set(field::kKOVAMDNamedLocation, place);
 }
 
 void AddGifTexts(std::string_view file, Exiv2::Image& image, Fields& fields) {
   const GifTexts texts = ReadGifTexts(file);
   if (!texts.xmp.empty()) (void)Exiv2::XmpParser::decode(image.xmpData(), texts.xmp);
-  fields.Add("KOVAMDComment", texts.comment);
+  fields.Add(field::kKOVAMDComment, texts.comment);
 }
 
 /// The library finds these parts in some HEIF files only.
@@ -307,9 +308,15 @@ void AddHeifParts(std::string_view file, Exiv2::Image& image) {
 
 void AddPngTexts(const PngParts& parts, Fields& fields) {
   static constexpr std::pair<std::string_view, const char*> kKeywords[] = {
-      {"Title", "KOVAMDTitle"},      {"Author", "KOVAMDAuthors"},       {"Description", "KOVAMDDescription"},
-      {"Comment", "KOVAMDComment"},  {"parameters", "KOVAMDComment"},   {"Copyright", "KOVAMDCopyright"},
-      {"Software", "KOVAMDCreator"}, {"Make", "KOVAMDAcquisitionMake"}, {"Model", "KOVAMDAcquisitionModel"},
+      {"Title", field::kKOVAMDTitle},
+      {"Author", field::kKOVAMDAuthors},
+      {"Description", field::kKOVAMDDescription},
+      {"Comment", field::kKOVAMDComment},
+      {"parameters", field::kKOVAMDComment},
+      {"Copyright", field::kKOVAMDCopyright},
+      {"Software", field::kKOVAMDCreator},
+      {"Make", field::kKOVAMDAcquisitionMake},
+      {"Model", field::kKOVAMDAcquisitionModel},
   };
   for (const auto& [keyword, text] : parts.texts) {
     for (const auto& [known, field] : kKeywords) {
@@ -338,7 +345,7 @@ void ReadImage(std::string_view file, const PngParts& png, Findings& findings) {
   AddExif(image->exifData(), fields, findings);
   AddRows<Exiv2::XmpData, Exiv2::XmpKey>(image->xmpData(), kCopiedRows, fields);
   AddPngTexts(png, fields);
-  fields.Add("KOVAMDComment", image->comment());
+  fields.Add(field::kKOVAMDComment, image->comment());
   AddTimes(*image, findings);
   AddExposure(image->exifData(), findings);
   AddResolution(image->exifData(), findings);
