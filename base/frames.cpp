@@ -114,10 +114,7 @@ UniqueFd ConnectUnixSocket(const std::string& path) {
   (void)setsockopt(connection.Get(), SOL_SOCKET, SO_SNDTIMEO, &longest, sizeof(longest));
   const bool connected = connect(connection.Get(), reinterpret_cast<const sockaddr*>(&address), sizeof(address)) == 0 ||
                          (errno == EINTR && FinishConnect(connection.Get()));
-  if (connected) return connection;
-  const int saved_errno = errno;
-  connection.Reset();
-  errno = saved_errno;
+  if (!connected) connection.Reset();
   return connection;
 }
 

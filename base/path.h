@@ -20,8 +20,12 @@ inline bool IsBelow(std::string_view path, std::string_view folder) {
   return path.size() > folder.size() && IsAtOrBelow(path, folder);
 }
 
+/// What stands before the last "/", the whole path when there is none: empty for what lies in "/", as IsAtOrBelow takes
+/// that folder. A part of `path`, valid as long as that is.
+inline std::string_view ParentOf(std::string_view path) { return path.substr(0, path.rfind('/')); }
+
 /// The folder that holds `path`: "/" for what lies in "/" (and for "/" itself), "." for a name without a folder. So the
-/// result can always be opened as it is, unlike that of ferrox::Dirname (common/file_util.h).
+/// result can always be opened as it is, unlike that of ParentOf.
 inline std::string FolderOf(std::string_view path) {
   const size_t slash = path.rfind('/');
   if (slash == std::string_view::npos) return ".";

@@ -2,6 +2,7 @@
 
 #include <unistd.h>
 
+#include <cerrno>
 #include <utility>
 
 namespace base {
@@ -20,7 +21,8 @@ class UniqueFd {
     Reset(other.Release());
     return *this;
   }
-  /// Closes without a look at the result, and may change errno: a writer that must know calls Close before.
+  /// Closes without a look at the result: a writer that must know calls Close before. errno stays as it is, that of the
+  /// call for whose failure the scope is left.
   ~UniqueFd() { Reset(); }
 
   /// The descriptor, still owned here; below 0 without one.
@@ -31,9 +33,14 @@ class UniqueFd {
   /// Closes now; false, with errno, when the kernel reports that written data could not be stored. Valid() before.
   /// Owns none afterwards in either case: the kernel has given up the descriptor even when it reports a failure.
   bool Close() { return close(std::exchange(fd_, -1)) == 0; }
-  /// Closes what it owns and owns `fd` from now on, which must not be the descriptor that it owns already.
+  /// Closes what it owns, without a change of errno, and owns `fd` from now on, which must not be the descriptor that
+  /// it owns already.
   void Reset(int fd = -1) {
-    if (fd_ >= 0) (void)close(fd_);
+    if (fd_ >= 0) {
+      const int saved_errno = errno;
+      (void)close(fd_);
+      errno = saved_errno;
+    }
     fd_ = fd;
   }
 

@@ -26,7 +26,7 @@ using Words = std::vector<std::string>;
 /// The folders of an indexed share below what has been typed so far: "/photo/tr" gives "/photo/trips".
 Words FoldersBelow(const std::string& typed) {
   Words found;
-  const std::string parent = typed.substr(0, typed.rfind('/'));
+  const std::string parent = Dirname(typed);
   for (const std::string& share : sdk::SDKShare::Enum()) {
     if (!base::IsAtOrBelow(parent, "/" + share)) continue;
     const std::string folder = sdk::SDKShare(share).GetPath() + parent.substr(1 + share.size());

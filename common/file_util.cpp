@@ -15,6 +15,7 @@
 #include <kova/user.h>
 
 #include "base/files.h"
+#include "base/path.h"
 #include "base/unique_fd.h"
 #include "common/log.h"
 #include "common/mutex.h"
@@ -62,15 +63,9 @@ bool StringStartWith(const std::string& text, const std::string& prefix) {
   return text.compare(0, prefix.size(), prefix) == 0;
 }
 
-std::string Basename(const std::string& path) {
-  const size_t slash = path.rfind('/');
-  return slash == std::string::npos ? path : path.substr(slash + 1);
-}
+std::string Basename(const std::string& path) { return base::NameOf(path); }
 
-std::string Dirname(const std::string& path) {
-  const size_t slash = path.rfind('/');
-  return slash == std::string::npos ? path : path.substr(0, slash);
-}
+std::string Dirname(const std::string& path) { return std::string(base::ParentOf(path)); }
 
 std::string GetFileExtension(const std::string& path, bool lower) {
   const std::string base = Basename(path);

@@ -11,6 +11,7 @@
 #include <kova/instance.h>
 
 #include "base/files.h"
+#include "base/path.h"
 #include "platform/shared/failure.h"
 
 namespace kova {
@@ -49,8 +50,7 @@ std::string Compose(const std::string& share_path, const char* folder_name, cons
   const bool is_there = stat(folder.c_str(), &info) == 0;
   // A user who can open a lock file in the folder could hold its lock, and keep the daemons out.
   if (is_there && (info.st_mode & 077) != 0 && info.st_uid == geteuid()) (void)chmod(folder.c_str(), 0700);
-  const bool made =
-      is_there || (base::MakeFolders(state.substr(0, state.rfind('/'))) && base::MakeFolders(folder, 0700));
+  const bool made = is_there || (base::MakeFolders(base::FolderOf(state)) && base::MakeFolders(folder, 0700));
   if (!made) {
     (void)KOVA_FAIL_ERRNO();
     return {};

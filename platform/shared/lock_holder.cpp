@@ -12,11 +12,12 @@
 #include <cstdlib>
 #include <filesystem>
 #include <fstream>
-#include <sstream>
 
 #include <kova/lock_holder.h>
 
+#include "base/files.h"
 #include "base/path.h"
+#include "base/unique_fd.h"
 
 namespace kova {
 
@@ -24,11 +25,10 @@ namespace {
 
 /// The content of a file below /proc, as far as it can be read: a process may end meanwhile, and reading its files
 /// fails then.
-std::string ReadWhole(const std::string& path) {
-  std::ifstream file(path);
-  std::ostringstream text;
-  if (file) text << file.rdbuf();
-  return text.str();
+std::string ReadProcFile(const std::string& path) {
+  std::string text;
+  (void)base::ReadWholeFile(path, text);
+  return text;
 }
 
 std::string ProcessFolder(pid_t pid) { return "/proc/" + std::to_string(pid); }
@@ -61,7 +61,7 @@ bool Holds(pid_t pid, const struct stat& file) {
     const std::string name = std::to_string(fd);
     if (stat((folder + "/fd/" + name).c_str(), &open_file) != 0) continue;
     if (open_file.st_dev != file.st_dev || open_file.st_ino != file.st_ino) continue;
-    if (ReadWhole(folder + "/fdinfo/" + name).find("\nlock:") != std::string::npos) return true;
+    if (ReadProcFile(folder + "/fdinfo/" + name).find("\nlock:") != std::string::npos) return true;
   }
   return false;
 }
@@ -86,7 +86,7 @@ std::vector<pid_t> InLockTable(const struct stat& file) {
 LockHolder Describe(pid_t pid) {
   LockHolder holder;
   holder.pid = pid;
-  const std::string status = "\n" + ReadWhole(ProcessFolder(pid) + "/status");
+  const std::string status = "\n" + ReadProcFile(ProcessFolder(pid) + "/status");
   holder.command = StatusField(status, "Name");
   holder.user = static_cast<uid_t>(strtoul(StatusField(status, "Uid").c_str(), nullptr, 10));
   return holder;
@@ -99,23 +99,6 @@ bool IsHeldByOthers(const std::string& path, const struct stat& folder) {
   return std::any_of(holders.begin(), holders.end(),
                      [&](const LockHolder& holder) { return !holder.command.empty() && !IsOurs(holder.user, folder); });
 }
-
-/// Unlike base::UniqueFd it keeps errno when it closes: what follows fails with the errno of the call that failed.
-class Descriptor {
- public:
-  explicit Descriptor(int fd) : fd_(fd) {}
-  Descriptor(const Descriptor&) = delete;
-  Descriptor& operator=(const Descriptor&) = delete;
-  ~Descriptor() {
-    const int saved_errno = errno;
-    if (fd_ >= 0) (void)close(fd_);
-    errno = saved_errno;
-  }
-  int Get() const { return fd_; }
-
- private:
-  int fd_;
-};
 
 bool IsAt(const std::string& path, const struct stat& file) {
   struct stat named = {};
@@ -131,16 +114,16 @@ bool GiveToOwnerOf(const struct stat& folder, int fd) {
 
 /// The new file belongs to the folder's owner, also when root makes it.
 Outcome MakeNew(const std::string& path, const struct stat& folder) {
-  const Descriptor file(open(path.c_str(), O_RDWR | O_CREAT | O_EXCL | O_CLOEXEC, 0600));
-  if (file.Get() < 0) return errno == EEXIST ? Outcome::kAgain : Outcome::kFailed;
+  const base::UniqueFd file(open(path.c_str(), O_RDWR | O_CREAT | O_EXCL | O_CLOEXEC, 0600));
+  if (!file.Valid()) return errno == EEXIST ? Outcome::kAgain : Outcome::kFailed;
   return GiveToOwnerOf(folder, file.Get()) ? Outcome::kPrivate : Outcome::kFailed;
 }
 
 /// Puts a new file in the place of `old`: whatever else is there by now, somebody may already rely on.
 Outcome Replace(const std::string& path, const struct stat& old, const struct stat& folder) {
   std::string temporary = path + ".XXXXXX";
-  const Descriptor file(mkostemp(temporary.data(), O_CLOEXEC));
-  if (file.Get() < 0) return Outcome::kFailed;
+  const base::UniqueFd file(mkostemp(temporary.data(), O_CLOEXEC));
+  if (!file.Valid()) return Outcome::kFailed;
   const bool is_ours = GiveToOwnerOf(folder, file.Get());
   const bool is_old = IsAt(path, old);
   if (is_ours && is_old && rename(temporary.c_str(), path.c_str()) == 0) return Outcome::kPrivate;
@@ -155,9 +138,9 @@ Outcome TryToMakePrivate(const std::string& path, const struct stat& folder) {
   if (lstat(path.c_str(), &file) != 0) return errno == ENOENT ? MakeNew(path, folder) : Outcome::kFailed;
   // What is no file of ours but lies here by our own doing is not for us to remove: it fails when it is opened.
   if (!S_ISREG(file.st_mode) && IsOurs(file.st_uid, folder)) return Outcome::kPrivate;
-  const Descriptor opened(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK));
+  const base::UniqueFd opened(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK));
   bool is_private = false, in_use = false;
-  if (opened.Get() >= 0 && fstat(opened.Get(), &file) == 0 && S_ISREG(file.st_mode)) {
+  if (opened.Valid() && fstat(opened.Get(), &file) == 0 && S_ISREG(file.st_mode)) {
     // While it is held here, nobody else replaces it, or takes it for the file that will be in its place.
     in_use = flock(opened.Get(), LOCK_EX | LOCK_NB) != 0;
     if (!IsAt(path, file)) return Outcome::kAgain;
@@ -195,7 +178,7 @@ bool IsStillAt(int fd, const std::string& path) {
 }
 
 bool IsEnding(pid_t pid) {
-  const std::string status = "\n" + ReadWhole(ProcessFolder(pid) + "/status");
+  const std::string status = "\n" + ReadProcFile(ProcessFolder(pid) + "/status");
   const std::string state = StatusField(status, "State");
   if (state.empty()) return kill(pid, 0) != 0 && errno == ESRCH;  // others' may be hidden
   if (state.front() == 'Z' || state.front() == 'X') return true;

@@ -7,6 +7,7 @@
 #include <cstring>
 #include <stdexcept>
 
+#include "base/text.h"
 #include "platform/shared/stamp.h"
 #include "wire/fields.h"
 
@@ -22,11 +23,7 @@ constexpr uint64_t kBlockBytes = 512;
 std::string ExtensionOf(const std::string& name) {
   const size_t dot = name.rfind('.');
   if (dot == std::string::npos) return {};
-  std::string extension = name.substr(dot + 1);
-  for (char& c : extension) {
-    if (c >= 'A' && c <= 'Z') c = static_cast<char>(c - 'A' + 'a');
-  }
-  return extension;
+  return base::LowerAscii(name.substr(dot + 1));
 }
 
 std::string Stamp(const struct statx& info) {

@@ -10,6 +10,7 @@
 #include <cstdio>
 #include <cstring>
 
+#include "base/path.h"
 #include "common/file_util.h"
 
 namespace ferrox::notifyd {
@@ -59,8 +60,7 @@ std::string NameOf(int folder) {
   char path[PATH_MAX];
   const ssize_t size = readlink(link, path, sizeof path);
   if (size <= 0) return {};
-  const std::string_view text(path, static_cast<size_t>(size));
-  return std::string(text.substr(text.rfind('/') + 1));
+  return base::NameOf({path, static_cast<size_t>(size)});
 }
 
 /// Without a change of its access time, where that is permitted.

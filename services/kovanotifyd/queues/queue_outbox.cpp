@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <utility>
 
+#include "base/path.h"
 #include "fileindex/queue/event.h"
 #include "fileindex/queue/queue_line.h"
 #include "services/kovanotifyd/queues/folder_cover.h"
@@ -18,11 +19,9 @@ using fileindex::EVENT_MODIFY;
 using fileindex::EVENT_REINDEX;
 using fileindex::EVENT_RENAME;
 
-std::string_view ParentOf(std::string_view path) { return path.substr(0, path.rfind('/')); }
-
 /// What a comparison in place of a line has to compare: a folder itself; of a file, the folder that it is in.
 ComparedFolder ComparisonFor(const std::string& path, bool is_folder, size_t root_size) {
-  const size_t size = is_folder ? path.size() : std::max(ParentOf(path).size(), root_size);
+  const size_t size = is_folder ? path.size() : std::max(base::ParentOf(path).size(), root_size);
   return {size == 0 ? "/" : path.substr(0, size), root_size};
 }
 
@@ -42,7 +41,7 @@ const QueueOutbox::Line* QueueOutbox::OpenLine(std::string_view path) const {
 bool QueueOutbox::IsBelowSubtreeLine(std::string_view path) const {
   bool is_below = false;
   if (subtree_lines_ == 0) return false;
-  open_.VisitUpwards(ParentOf(path), [&](size_t place) { return is_below = CoversSubtree(lines_[place]); });
+  open_.VisitUpwards(base::ParentOf(path), [&](size_t place) { return is_below = CoversSubtree(lines_[place]); });
   return is_below;
 }
 
