@@ -6,6 +6,7 @@
 #include <string>
 #include <string_view>
 
+#include "services/kovacontentextractd/readers/declared_encoding.h"
 #include "services/kovacontentextractd/readers/encoding.h"
 #include "services/kovacontentextractd/readers/markup.h"
 #include "services/kovacontentextractd/readers/utf8.h"

@@ -3,9 +3,12 @@
 #include <algorithm>
 #include <array>
 #include <cstring>
+#include <optional>
 
 #include "services/kovacontentextractd/readers/code_pages.h"
 #include "services/kovacontentextractd/readers/entities.h"
+#include "services/kovacontentextractd/readers/markup_bytes.h"
+#include "services/kovacontentextractd/readers/page_text.h"
 #include "services/kovacontentextractd/readers/utf8.h"
 
 namespace ferrox::extract {
@@ -23,28 +26,6 @@ constexpr size_t kMarkupAttributeMaxBytes = 64 * 1024;
 /// Of a reference to a character, with "&" and ";".
 constexpr size_t kMarkupReferenceMaxBytes = 32;
 constexpr size_t kNotFound = std::string_view::npos;
-
-char Lower(char c) { return c >= 'A' && c <= 'Z' ? static_cast<char>(c - 'A' + 'a') : c; }
-
-bool IsHtmlBlank(char c) { return c == ' ' || c == '\t' || c == '\n' || c == '\r' || c == '\f'; }
-
-/// The bytes of the blank at `at`, a no-break space among them; 0 when there is none.
-size_t BlankLength(std::string_view text, size_t at) {
-  if (IsHtmlBlank(text[at])) return 1;
-  return text[at] == '\xC2' && at + 1 < text.size() && text[at + 1] == '\xA0' ? 2 : 0;
-}
-
-bool IsLetter(char c) { return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z'); }
-
-bool IsNameByte(char c) {
-  return IsLetter(c) || (c >= '0' && c <= '9') || c == '-' || c == '_' || c == ':' || c == '.' || (c & 0x80) != 0;
-}
-
-bool StartsWithNoCase(std::string_view text, std::string_view lower_prefix) {
-  if (text.size() < lower_prefix.size()) return false;
-  return std::equal(lower_prefix.begin(), lower_prefix.end(), text.begin(),
-                    [](char wanted, char c) { return wanted == Lower(c); });
-}
 
 /// Remembers where a byte comes next, so that asking again from further on does not search the same bytes again.
 class NextByte {
@@ -65,56 +46,6 @@ class NextByte {
   char wanted_;
   bool known_ = false;
   size_t at_ = 0;
-};
-
-/// Collects text with runs of blanks as one, up to a limit.
-class TextSink {
- public:
-  explicit TextSink(size_t limit_bytes) : limit_bytes_(limit_bytes) {}
-
-  void Add(std::string_view piece) {
-    size_t word_at = 0;
-    for (size_t at = 0; at < piece.size();) {
-      const size_t blank = BlankLength(piece, at);
-      if (blank == 0) {
-        ++at;
-        continue;
-      }
-      if (at > word_at) AddWord(piece.substr(word_at, at - word_at));
-      Separate(piece[at] == '\n' ? '\n' : ' ');
-      word_at = at += blank;
-    }
-    if (piece.size() > word_at) AddWord(piece.substr(word_at));
-  }
-
-  /// What stands between the text so far and what follows; a line end wins over a blank.
-  void Separate(char separator) {
-    if (separator_ != '\n') separator_ = separator;
-  }
-
-  bool Full() const { return full_; }
-  std::string Take() { return std::move(text_); }
-  bool Empty() const { return text_.empty(); }
-
- private:
-  void AddWord(std::string_view word) {
-    const size_t separator = separator_ != '\0' && !text_.empty() ? 1 : 0;
-    if (text_.size() + separator + word.size() > limit_bytes_) {
-      const size_t room = limit_bytes_ - std::min(limit_bytes_, text_.size() + separator);
-      word = CutAtCharacter(word, room);
-      full_ = true;
-    }
-    if (!word.empty()) {
-      if (separator != 0) text_ += separator_;
-      text_ += word;
-    }
-    separator_ = '\0';
-  }
-
-  size_t limit_bytes_;
-  std::string text_;
-  char separator_ = '\0';
-  bool full_ = false;
 };
 
 /// Elements of HTML within a line: they do not separate words.
@@ -152,7 +83,7 @@ class MarkupReader {
 
  private:
   /// A title that never ends is given up when it is long enough.
-  TextSink& Sink() {
+  PageText& Sink() {
     if (title_.Full()) in_title_ = false;
     return in_title_ ? title_ : text_;
   }
@@ -166,8 +97,8 @@ class MarkupReader {
     if (rest.substr(0, 2) == "<?"sv) return SkipPast(html_ ? ">"sv : "?>"sv);
     if (rest.substr(0, 2) == "<!"sv) return SkipDeclaration();
     const size_t name_at = rest.size() > 1 && rest[1] == '/' ? 2 : 1;
-    const bool is_tag = rest.size() > name_at &&
-                        (IsLetter(rest[name_at]) || (!html_ && (rest[name_at] == '_' || (rest[name_at] & 0x80) != 0)));
+    const bool is_tag = rest.size() > name_at && (IsMarkupLetter(rest[name_at]) ||
+                                                  (!html_ && (rest[name_at] == '_' || (rest[name_at] & 0x80) != 0)));
     if (is_tag) return ReadTag(name_at == 2);
     Sink().Add("<"sv);
     ++at_;
@@ -213,12 +144,11 @@ class MarkupReader {
     const size_t begin = at_ + (closing ? 2 : 1);
     size_t end = begin;
     std::array<char, 24> lower;
-    while (end < source_.size() && IsNameByte(source_[end])) ++end;
+    while (end < source_.size() && IsMarkupNameByte(source_[end])) ++end;
     std::string_view name = source_.substr(begin, end - begin);
     if (!html_) name.remove_prefix(name.find(':') == kNotFound ? 0 : name.find(':') + 1);
     name = name.substr(0, lower.size());
-    std::transform(
-        name.begin(), name.end(), lower.begin(), html_ ? &Lower : [](char c) { return c; });
+    std::transform(name.begin(), name.end(), lower.begin(), [this](char c) { return html_ ? base::LowerAscii(c) : c; });
     at_ = end;
     const bool empty_element = SkipAttributes();
     Enter(std::string_view(lower.data(), name.size()), closing, empty_element);
@@ -274,7 +204,7 @@ class MarkupReader {
 
   /// Text between tags, with its references resolved.
   void AddCharacters(std::string_view characters) {
-    TextSink& sink = Sink();
+    PageText& sink = Sink();
     while (!characters.empty()) {
       const size_t reference = std::min(characters.find('&'), characters.size());
       sink.Add(characters.substr(0, reference));
@@ -284,7 +214,7 @@ class MarkupReader {
   }
 
   /// Resolves the reference that the text begins with; returns its length. What is none stands for itself.
-  size_t AddReference(std::string_view text, TextSink& sink) const {
+  size_t AddReference(std::string_view text, PageText& sink) const {
     const size_t end = text.substr(0, kMarkupReferenceMaxBytes).find(';');
     const uint32_t code_point = end == kNotFound ? 0 : Resolve(text.substr(1, end - 1));
     if (code_point == 0) {
@@ -304,52 +234,23 @@ class MarkupReader {
   /// The character of the reference `name`, without "&" and ";"; 0 when it is not known.
   uint32_t Resolve(std::string_view name) const {
     if (name.size() < 2 || name[0] != '#') return html_ ? HtmlEntity(name) : XmlEntity(name);
-    const bool hex = name[1] == 'x' || name[1] == 'X';
-    uint32_t code_point = 0;
-    for (const char c : name.substr(hex ? 2 : 1)) {
-      const char lower = Lower(c);
-      const bool digit = c >= '0' && c <= '9';
-      if (!digit && !(hex && lower >= 'a' && lower <= 'f')) return 0;
-      const auto value = static_cast<uint32_t>(digit ? c - '0' : lower - 'a' + 10);
-      code_point = std::min<uint32_t>(code_point * (hex ? 16 : 10) + value, 0x110000);
-    }
+    const std::optional<uint32_t> number = ReferenceNumber(name);
+    if (!number) return 0;
     // Numbers that are control characters in Unicode are written by programs that think in Windows-1252.
-    if (html_ && code_point >= 0x80 && code_point < 0xA0)
-      return FromWindows1252(static_cast<unsigned char>(code_point));
-    return code_point < 0x20 ? ' ' : code_point;
-  }
-
-  /// XML has five names; others would need the document type, which is not read.
-  static uint32_t XmlEntity(std::string_view name) {
-    const bool known = name == "amp"sv || name == "lt"sv || name == "gt"sv || name == "quot"sv || name == "apos"sv;
-    return known ? HtmlEntity(name) : 0;
+    if (html_ && *number >= 0x80 && *number < 0xA0) return FromWindows1252(static_cast<unsigned char>(*number));
+    return *number < 0x20 ? ' ' : *number;
   }
 
   std::string_view source_;
   bool html_;
   size_t at_ = 0;
-  TextSink text_;
-  TextSink title_;
+  PageText text_;
+  PageText title_;
   bool in_title_ = false;
   // The next quotes of either kind, for attributes.
   NextByte next_double_{'"'};
   NextByte next_single_{'\''};
 };
-
-/// The value that follows `key` and "=" at the beginning of `text`, quoted or not.
-std::string ValueAfter(std::string_view text, std::string_view key) {
-  if (!StartsWithNoCase(text, key)) return {};
-  text.remove_prefix(key.size());
-  const auto skip_blanks = [&text] { text.remove_prefix(std::min(text.find_first_not_of(" \t\r\n"sv), text.size())); };
-  skip_blanks();
-  if (text.empty() || text.front() != '=') return {};
-  text.remove_prefix(1);
-  skip_blanks();
-  if (!text.empty() && (text.front() == '"' || text.front() == '\'')) text.remove_prefix(1);
-  size_t length = 0;
-  while (length < text.size() && length < 40 && IsNameByte(text[length])) ++length;
-  return std::string(text.substr(0, length));
-}
 
 }  // namespace
 
@@ -359,30 +260,6 @@ MarkupText ReadHtml(std::string_view source, size_t limit_bytes) {
 
 MarkupText ReadXml(std::string_view source, size_t limit_bytes) {
   return MarkupReader(source, limit_bytes, false).Read();
-}
-
-std::string DeclaredHtmlEncoding(std::string_view head) {
-  head = head.substr(0, 4096);
-  for (size_t tag = head.find('<'); tag != kNotFound; tag = head.find('<', tag + 1)) {
-    if (!StartsWithNoCase(head.substr(tag), "<meta"sv)) continue;
-    const std::string_view inside = head.substr(tag, head.find('>', tag) - tag);
-    for (size_t at = 5; at < inside.size(); ++at) {
-      std::string value = ValueAfter(inside.substr(at), "charset"sv);
-      if (!value.empty()) return value;
-    }
-  }
-  return DeclaredXmlEncoding(head);
-}
-
-std::string DeclaredXmlEncoding(std::string_view head) {
-  const size_t begin = head.substr(0, 5) == "<?xml"sv ? 5 : kNotFound;
-  if (begin == kNotFound) return {};
-  const std::string_view inside = head.substr(0, std::min<size_t>(head.find("?>"sv), 512));
-  for (size_t at = begin; at < inside.size(); ++at) {
-    std::string value = ValueAfter(inside.substr(at), "encoding"sv);
-    if (!value.empty()) return value;
-  }
-  return {};
 }
 
 }  // namespace ferrox::extract

@@ -1,13 +1,12 @@
 #pragma once
 
-#include <array>
 #include <cstddef>
 #include <string>
 #include <string_view>
 #include <utility>
 #include <vector>
 
-#include "services/kovacontentextractd/readers/byte_source.h"
+#include "services/kovacontentextractd/readers/xml_input.h"
 
 namespace ferrox::extract {
 
@@ -27,7 +26,7 @@ class XmlTokenizer {
   static constexpr int kDepthMax = 256;
 
   /// `source` must outlive this; it is read as tokens are asked for.
-  explicit XmlTokenizer(ByteSource& source);
+  explicit XmlTokenizer(ByteSource& source) : input_(source) {}
   XmlTokenizer(const XmlTokenizer&) = delete;
   XmlTokenizer& operator=(const XmlTokenizer&) = delete;
 
@@ -50,22 +49,13 @@ class XmlTokenizer {
   int Depth() const { return depth_; }
 
  private:
-  enum class Charset { kUnknown, kUtf8, kUtf16Little, kUtf16Big };
   struct NamedValue {
     std::string name;
     std::string value;
   };
 
   static std::string_view LocalName(std::string_view name);
-  bool Refill();
-  void DetectCharset();
-  void FillUtf16();
-  bool Has(size_t count);
-  bool StartsWith(std::string_view text);
-  bool SkipPast(std::string_view end);
-  bool SkipDocumentType();
-  void SkipBlanks();
-  std::string_view Rest() const { return {buffer_.data() + begin_, end_ - begin_}; }
+  void SkipDocumentType();
   Token ReadText();
   Token TakeText(size_t size);
   Token ReadReference();
@@ -79,13 +69,7 @@ class XmlTokenizer {
   size_t Resolve(std::string& out);
   Token Bad();
 
-  ByteSource& source_;
-  Charset charset_ = Charset::kUnknown;
-  std::array<char, 16384> buffer_;  ///< UTF-8; what is unread lies from begin_ to end_
-  std::array<char, 4096> wide_;     ///< UTF-16 that is not converted yet
-  size_t wide_size_ = 0;
-  size_t begin_ = 0, end_ = 0;
-  bool source_ended_ = false;
+  XmlInput input_;
   bool in_cdata_ = false;       ///< within "<![CDATA[", of which the end is to come
   bool close_pending_ = false;  ///< behind an empty element
   bool bad_ = false;
