@@ -1,7 +1,6 @@
 #include "services/kovacontentextractd/readers/rich_text.h"
 
 #include <algorithm>
-#include <array>
 #include <map>
 #include <string>
 #include <string_view>
@@ -9,7 +8,8 @@
 
 #include "services/kovacontentextractd/readers/byte_source.h"
 #include "services/kovacontentextractd/readers/code_pages.h"
-#include "services/kovacontentextractd/readers/cpu_budget.h"
+#include "services/kovacontentextractd/readers/rich_text_input.h"
+#include "services/kovacontentextractd/readers/rich_text_words.h"
 #include "services/kovacontentextractd/readers/times.h"
 #include "services/kovacontentextractd/readers/utf8.h"
 
@@ -31,12 +31,10 @@ constexpr size_t kDepthMax = 2000;
 constexpr size_t kFontsMax = 10000;
 /// How much text is collected before it is handed on, and the longest text of a field.
 constexpr size_t kRichPieceBytes = 32U << 10;
-constexpr int kMacRoman = 10000;
 /// The processor time for one file. Pictures are most of a long file, written in hexadecimal digits.
 constexpr std::chrono::milliseconds kRichCpuMax(1500);
 
-/// Where text goes in a group.
-enum class Target : uint8_t { kText, kNowhere, kFontTable, kField };
+using Target = RichTextTarget;
 
 /// The state that a group has of its own.
 struct Group {
@@ -48,99 +46,14 @@ struct Group {
   int unicode_fallback = 1;  ///< characters behind a Unicode one, for programs that do not know it
 };
 
-/// A control word that makes its group a destination.
-struct NamedTarget {
-  std::string_view word;
-  Target target;
-  const char* field = nullptr;
-};
-
-constexpr NamedTarget kTargets[] = {
-    {"fonttbl", Target::kFontTable},
-    {"title", Target::kField, field::kKOVAMDTitle},
-    {"subject", Target::kField, field::kKOVAMDDescription},
-    {"author", Target::kField, field::kKOVAMDAuthors},
-    {"operator", Target::kField, field::kKOVAMDContributors},
-    {"keywords", Target::kField, field::kKOVAMDKeywords},
-    {"category", Target::kField, field::kKOVAMDKeywords},
-    {"doccomm", Target::kField, field::kKOVAMDComment},
-    {"company", Target::kField, field::kKOVAMDOrganizations},
-    {"generator", Target::kField, field::kKOVAMDCreator},
-    {"info", Target::kNowhere},
-    {"colortbl", Target::kNowhere},
-    {"stylesheet", Target::kNowhere},
-    {"pict", Target::kNowhere},
-    {"objdata", Target::kNowhere},
-    {"fldinst", Target::kNowhere},
-    {"listtable", Target::kNowhere},
-    {"listoverridetable", Target::kNowhere},
-    {"themedata", Target::kNowhere},
-    {"datastore", Target::kNowhere},
-    {"xmlnstbl", Target::kNowhere},
-    {"rsidtbl", Target::kNowhere},
-    {"filetbl", Target::kNowhere},
-    {"revtbl", Target::kNowhere},
-    {"bkmkstart", Target::kNowhere},
-    {"bkmkend", Target::kNowhere},
-    {"shppict", Target::kText},
-    {"footnote", Target::kText},
-    {"annotation", Target::kText},
-    {"shptxt", Target::kText},
-};
-
-/// A control word that stands for a character.
-struct NamedCharacter {
-  std::string_view word;
-  uint32_t code;
-};
-
-constexpr NamedCharacter kCharacters[] = {
-    {"par", '\n'},      {"line", '\n'},     {"row", '\n'},      {"sect", '\n'},        {"page", '\n'},
-    {"cell", '\t'},     {"nestcell", '\t'}, {"tab", '\t'},      {"emdash", 0x2014},    {"endash", 0x2013},
-    {"bullet", 0x2022}, {"lquote", 0x2018}, {"rquote", 0x2019}, {"ldblquote", 0x201C}, {"rdblquote", 0x201D},
-    {"emspace", ' '},   {"enspace", ' '},
-};
-
-/// The code page of a font's character set ("\fcharset"); 0 for one that is not known.
-int CodePageOf(int charset) {
-  static constexpr std::array<std::pair<int, int>, 17> kCharsets = {{{0, 1252},
-                                                                     {77, kMacRoman},
-                                                                     {128, 932},
-                                                                     {129, 949},
-                                                                     {130, 1361},
-                                                                     {134, 936},
-                                                                     {136, 950},
-                                                                     {161, 1253},
-                                                                     {162, 1254},
-                                                                     {163, 1258},
-                                                                     {177, 1255},
-                                                                     {178, 1256},
-                                                                     {186, 1257},
-                                                                     {204, 1251},
-                                                                     {222, 874},
-                                                                     {238, 1250},
-                                                                     {255, 437}}};
-  for (const auto& [number, code_page] : kCharsets) {
-    if (number == charset) return code_page;
-  }
-  return 0;
-}
-
-bool IsLetter(int c) { return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z'); }
-
-int HexDigit(int c) {
-  if (c >= '0' && c <= '9') return c - '0';
-  const int lower = c | 0x20;
-  return lower >= 'a' && lower <= 'f' ? lower - 'a' + 10 : -1;
-}
-
 /// Reads a file in one pass, with memory for the open groups and the table of fonts.
 class RichTextReader {
  public:
-  RichTextReader(const Source& source, Findings& findings) : source_(source), findings_(findings), groups_(1) {}
+  RichTextReader(const Source& source, Findings& findings)
+      : input_(source, kRichCpuMax), findings_(findings), groups_(1) {}
 
   void Read() {
-    for (int c = Get(); c >= 0 && !done_; c = Get()) {
+    for (int c = input_.Get(); c >= 0 && !done_; c = input_.Get()) {
       if (c == '{') {
         Open();
       } else if (c == '}') {
@@ -153,21 +66,11 @@ class RichTextReader {
     }
     FlushBytes();
     FlushText();
-    if (budget_.IsSpent()) findings_.MarkCut();
+    if (input_.TimeIsUp()) findings_.MarkCut();
   }
 
  private:
   Group& Top() { return groups_.back(); }
-
-  int Get() {
-    if (at_ == size_) {
-      size_ = budget_.IsSpent() ? 0 : source_.Read(buffer_.data(), buffer_.size());
-      at_ = 0;
-    }
-    return at_ < size_ ? static_cast<unsigned char>(buffer_[at_++]) : -1;
-  }
-  /// Of the byte that Get gave last, if it gave one.
-  void Unget() { at_ -= size_ > 0 ? 1 : 0; }
 
   /// "{": the new group has the state of the one around it.
   void Open() {
@@ -193,29 +96,16 @@ class RichTextReader {
 
   /// What follows a "\": a byte in hexadecimal digits, a symbol, or a word with its number.
   void ReadControl() {
-    const int c = Get();
-    if (c == '\'') return ReadHexByte();
-    if (!IsLetter(c)) return ReadSymbol(c);
-    std::string word;
-    int next = c;
-    for (; IsLetter(next); next = Get()) {
-      if (word.size() < 32) word += static_cast<char>(next);
+    const int c = input_.Get();
+    if (c == '\'') {
+      const int byte = input_.ReadHexByte();
+      if (byte >= 0) AddByte(static_cast<char>(byte));
+    } else if (RichTextInput::BeginsWord(c)) {
+      const RichTextInput::Word word = input_.ReadWord(c);
+      Do(word.name, word.number);
+    } else {
+      ReadSymbol(c);
     }
-    const bool negative = next == '-';
-    if (negative) next = Get();
-    int64_t number = 0;
-    bool has_number = false;
-    for (; next >= '0' && next <= '9'; next = Get()) {
-      number = std::min<int64_t>(number * 10 + (next - '0'), INT32_MAX);
-      has_number = true;
-    }
-    if (next >= 0 && next != ' ') Unget();
-    Do(word, has_number ? static_cast<int>(negative ? -number : number) : 1);
-  }
-
-  void ReadHexByte() {
-    const int high = HexDigit(Get()), low = HexDigit(Get());
-    if (high >= 0 && low >= 0) AddByte(static_cast<char>(high * 16 + low));
   }
 
   void ReadSymbol(int c) {
@@ -233,17 +123,15 @@ class RichTextReader {
       Top().unicode_fallback = std::clamp(number, 0, 100);
       return;
     }
-    if (word == "bin"sv) return SkipBytes(number);
+    if (word == "bin"sv) return input_.Skip(number);  // a picture as it is, braces among its bytes
     if (word == "f"sv) return SelectFont(number);
     if (word == "fcharset"sv) return SetCharset(number);
     if (word == "ansicpg"sv) return SetCodePage(number);
     if (word == "mac"sv || word == "pc"sv) {
-      ansi_code_page_ = Top().code_page = word == "pc"sv ? 437 : kMacRoman;
+      ansi_code_page_ = Top().code_page = word == "pc"sv ? 437 : kMacRomanCodePage;
       return;
     }
-    for (const NamedCharacter& character : kCharacters) {
-      if (character.word == word) return AddCharacter(character.code);
-    }
+    if (const uint32_t character = RichTextCharacter(word)) return AddCharacter(character);
     if (word == "creatim"sv) return ReadTime();
     if (word == "ud"sv) {
       Top().is_unicode = true;
@@ -255,9 +143,8 @@ class RichTextReader {
 
   /// A group that begins with "\*" and a word that we do not know is for others.
   void SetTarget(std::string_view word) {
-    const auto* found = std::find_if(std::begin(kTargets), std::end(kTargets),
-                                     [&](const NamedTarget& target) { return target.word == word; });
-    const bool known = found != std::end(kTargets);
+    const RichTextDestination* found = FindRichTextDestination(word);
+    const bool known = found != nullptr;
     if (!known && !optional_) return;
     optional_ = false;
     FlushBytes();
@@ -282,14 +169,14 @@ class RichTextReader {
 
   /// Programs that call their text both ANSI and Mac's have written ANSI.
   void SetCodePage(int number) {
-    const bool is_ansi = number == kMacRoman && ansi_code_page_ != kMacRoman;
+    const bool is_ansi = number == kMacRomanCodePage && ansi_code_page_ != kMacRomanCodePage;
     if (number > 1) ansi_code_page_ = Top().code_page = is_ansi ? 1252 : number;
   }
 
   /// "\fcharset" of the font that is described; 0 and 1 stand for the document's own code page.
   void SetCharset(int charset) {
     if (Top().target == Target::kFontTable && fonts_.size() < kFontsMax) {
-      fonts_[font_] = charset <= 1 ? ansi_code_page_ : CodePageOf(charset);
+      fonts_[font_] = charset <= 1 ? ansi_code_page_ : CodePageOfCharset(charset);
     }
   }
 
@@ -297,8 +184,8 @@ class RichTextReader {
   void ReadTime() {
     CivilTime time;
     std::string text;
-    for (int c = Get(); c >= 0 && c != '}' && text.size() < 200; c = Get()) text += static_cast<char>(c);
-    Unget();
+    for (int c = input_.Get(); c >= 0 && c != '}' && text.size() < 200; c = input_.Get()) text += static_cast<char>(c);
+    input_.Unget();
     const auto number = [&](std::string_view word) {
       const size_t at = text.find(word);
       int value = 0;
@@ -310,14 +197,6 @@ class RichTextReader {
     };
     time = {number("\\yr"), number("\\mo"), number("\\dy"), number("\\hr"), number("\\min"), 0};
     if (const auto seconds = ToSeconds(time)) findings_.SetInteger(field::kKOVAMDContentCreationDate, *seconds);
-  }
-
-  /// "\bin": so many bytes of a picture follow as they are, braces among them.
-  void SkipBytes(int count) {
-    if (count <= 0) return;
-    const size_t here = std::min(static_cast<size_t>(count), size_ - at_);
-    at_ += here;
-    source_.Skip(static_cast<uint64_t>(count) - here);
   }
 
   /// A byte of text, in the code page of the group.
@@ -378,11 +257,8 @@ class RichTextReader {
     done_ = true;
   }
 
-  FileSource source_;
+  RichTextInput input_;
   Findings& findings_;
-  std::array<char, 16384> buffer_;
-  size_t at_ = 0, size_ = 0;
-  const CpuBudget budget_{kRichCpuMax};
   std::vector<Group> groups_;
   std::map<int, int> fonts_;  ///< their code pages
   int font_ = 0;              ///< the one in the table that is being read
