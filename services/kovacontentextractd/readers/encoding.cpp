@@ -1,17 +1,13 @@
 #include "services/kovacontentextractd/readers/encoding.h"
 
-#include <iconv.h>
 #include <uchardet.h>
 
 #include <algorithm>
-#include <array>
-#include <cerrno>
 #include <cstring>
-#include <map>
 #include <memory>
-#include <vector>
+#include <utility>
 
-#include "base/mutex.h"
+#include "services/kovacontentextractd/readers/converters.h"
 #include "services/kovacontentextractd/readers/utf8.h"
 
 namespace ferrox::extract {
@@ -20,8 +16,7 @@ namespace {
 
 // What encoding a text is in is decided by certainty: what its bytes prove (marks, valid UTF-8, zeros of UTF-16,
 // escapes), then what it says itself, then what statistics make of it (libuchardet), which needs some dozens of letters
-// outside ASCII. The C library's converters do the rest; they are files of their own and must be loaded before the
-// sandbox closes (LoadConverters).
+// outside ASCII. The C library's converters (converters.h) do the rest.
 
 /// How much statistics are shown.
 constexpr size_t kDetectMaxBytes = 16 * 1024;
@@ -50,78 +45,8 @@ size_t CountHighBytes(std::string_view bytes) {
   return static_cast<size_t>(std::count_if(bytes.begin(), bytes.end(), [](char c) { return (c & 0x80) != 0; }));
 }
 
-/// A thread's converters to UTF-8. Opening one loads a library, which costs more than converting a small file, so they
-/// are kept.
-class Converters {
- public:
-  static inline const iconv_t kNone = reinterpret_cast<iconv_t>(-1);
-
-  /// A converter in its initial state; kNone when there is no such encoding.
-  static iconv_t Get(const std::string& encoding) {
-    thread_local Converters mine;
-    const auto found = mine.open_.find(encoding);
-    if (found == mine.open_.end()) return mine.Open(encoding);
-    if (found->second != kNone) (void)iconv(found->second, nullptr, nullptr, nullptr, nullptr);
-    return found->second;
-  }
-
-  ~Converters() { CloseAll(); }
-
- private:
-  static constexpr size_t kKeptMax = 16;  // the content names encodings, and it may name many
-
-  /// The C library loads and unloads under a lock of its own, which the thread sanitizer cannot see.
-  static base::Mutex& LoadMutex() {
-    static auto* mutex = new base::Mutex;  // never freed: threads may end after main
-    return *mutex;
-  }
-
-  iconv_t Open(const std::string& encoding) {
-    if (open_.size() >= kKeptMax) CloseAll();
-    const base::MutexLock guard(LoadMutex());
-    return open_[encoding] = iconv_open("UTF-8", encoding.c_str());
-  }
-
-  void CloseAll() {
-    const base::MutexLock guard(LoadMutex());
-    for (const auto& [name, converter] : open_) {
-      if (converter != kNone) (void)iconv_close(converter);
-    }
-    open_.clear();
-  }
-
-  std::map<std::string, iconv_t> open_;
-};
-
-/// Converts to UTF-8. What is not valid becomes U+FFFD; false when that is more than one byte in a hundred, or there is
-/// no such encoding. A character cut off at the end is dropped when `cut`.
-bool Convert(std::string_view bytes, const std::string& encoding, bool cut, std::string& text) {
-  const iconv_t converter = Converters::Get(encoding);
-  if (converter == Converters::kNone) return false;
-  text.clear();
-  text.reserve(bytes.size() + bytes.size() / 2);
-  size_t bad = 0;
-  char* from = const_cast<char*>(bytes.data());
-  size_t left = bytes.size();
-  std::array<char, 16384> buffer;
-  while (left > 0) {
-    char* to = buffer.data();
-    size_t room = buffer.size();
-    const size_t result = iconv(converter, &from, &left, &to, &room);
-    text.append(buffer.data(), buffer.size() - room);
-    if (result != static_cast<size_t>(-1) || errno == E2BIG) continue;
-    if (errno == EINVAL && cut) break;
-    AppendUtf8(text, 0xFFFD);
-    ++from;
-    --left;
-    if (++bad * 100 > bytes.size()) return false;
-  }
-  return true;
-}
-
-// UTF-16 and UTF-32 need no tables; done here, a file of either costs no converter.
-
-// False when more than one unit in a hundred is none that a text has: an unpaired surrogate, a zero, U+FFFE.
+// UTF-16 and UTF-32 need no tables; done here, a file of either costs no converter. Both functions are false when more
+// than one unit in a hundred is none that a text has: an unpaired surrogate, a zero, U+FFFE.
 
 bool FromUtf16(std::string_view bytes, bool big_endian, std::string& text) {
   text.clear();
@@ -302,32 +227,16 @@ bool Guess(std::string_view bytes, bool cut, DecodedText& decoded) {
   const std::string detected = WithWindowsLetters(Usual(Detect(telling)), telling);
   const bool sure = CountHighBytes(telling) >= kSureFromBytes;
   const bool usable = !detected.empty() && detected.find("UTF-") != 0 && (sure || IsCommon(detected));
-  if (usable && Convert(bytes, detected, cut, decoded.text)) {
+  if (usable && ConvertToUtf8(bytes, detected, cut, decoded.text)) {
     decoded.encoding = detected + (sure ? "" : " (guess)");
     return true;
   }
   // Western leaves five bytes open, so real text passes and scattered bytes mostly do not.
   decoded.encoding = std::string(kWestern) + " (guess)";
-  return Convert(bytes, kWestern, cut, decoded.text);
+  return ConvertToUtf8(bytes, kWestern, cut, decoded.text);
 }
 
 }  // namespace
-
-void HoldConverter(const char* from, const char* to) {
-  static auto* held = new std::vector<iconv_t>;  // never freed
-  held->push_back(iconv_open(to, from));
-}
-
-void LoadConverters() {
-  static constexpr const char* kInUse[] = {
-      "WINDOWS-1250", "WINDOWS-1251", "WINDOWS-1252", "WINDOWS-1253", "WINDOWS-1254", "WINDOWS-1255", "WINDOWS-1256",
-      "WINDOWS-1257", "WINDOWS-1258", "WINDOWS-874",  "ISO-8859-2",   "ISO-8859-3",   "ISO-8859-4",   "ISO-8859-5",
-      "ISO-8859-6",   "ISO-8859-7",   "ISO-8859-8",   "ISO-8859-10",  "ISO-8859-13",  "ISO-8859-15",  "ISO-8859-16",
-      "KOI8-U",       "IBM850",       "IBM852",       "IBM855",       "IBM866",       "MACINTOSH",    "MAC-CYRILLIC",
-      "GB18030",      "CP932",        "EUC-JP",       "ISO-2022-JP",  "UHC",          "ISO-2022-KR",  "JOHAB",
-      "BIG5-HKSCS",   "EUC-TW"};
-  for (const char* encoding : kInUse) HoldConverter(encoding, "UTF-8");
-}
 
 /// In the order of certainty that the header gives. Zeros in what is not UTF-16 are no text.
 bool Decode(std::string_view bytes, bool cut, const std::string& declared, DecodedText& decoded) {
@@ -338,7 +247,7 @@ bool Decode(std::string_view bytes, bool cut, const std::string& declared, Decod
   if (LooksBinary(bytes)) return false;
   if (HasJapaneseEscapes(bytes)) {
     decoded.encoding = "ISO-2022-JP";
-    if (Convert(bytes, decoded.encoding, cut, decoded.text)) return true;
+    if (ConvertToUtf8(bytes, decoded.encoding, cut, decoded.text)) return true;
   }
   if (IsUtf8(bytes, cut)) {
     decoded.encoding = "UTF-8";
@@ -349,7 +258,7 @@ bool Decode(std::string_view bytes, bool cut, const std::string& declared, Decod
   if (!declared.empty()) {
     decoded.encoding = Usual(declared);
     const bool eight_bit = decoded.encoding.find("UTF-") != 0 && decoded.encoding.find("UCS") != 0;
-    if (eight_bit && Convert(bytes, decoded.encoding, cut, decoded.text)) return true;
+    if (eight_bit && ConvertToUtf8(bytes, decoded.encoding, cut, decoded.text)) return true;
   }
   return Guess(bytes, cut, decoded);
 }

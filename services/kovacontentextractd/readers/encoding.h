@@ -17,10 +17,4 @@ struct DecodedText {
 /// @return false when the bytes are no text.
 bool Decode(std::string_view bytes, bool cut, const std::string& declared, DecodedText& decoded);
 
-/// Loads a converter of the C library and holds it for good: one that nobody holds is unloaded, also for libraries that
-/// convert by themselves.
-void HoldConverter(const char* from, const char* to);
-/// Loads the converters of the encodings in use; after it they need no file any more.
-void LoadConverters();
-
 }  // namespace ferrox::extract

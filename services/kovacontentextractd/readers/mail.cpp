@@ -10,6 +10,7 @@
 #include <utility>
 
 #include "services/kovacontentextractd/readers/byte_source.h"
+#include "services/kovacontentextractd/readers/converters.h"
 #include "services/kovacontentextractd/readers/cpu_budget.h"
 #include "services/kovacontentextractd/readers/encoding.h"
 #include "services/kovacontentextractd/readers/latin1.h"

@@ -6,6 +6,7 @@
 #include <algorithm>
 #include <cerrno>
 
+#include "services/kovacontentextractd/readers/converters.h"
 #include "services/kovacontentextractd/readers/declared_encoding.h"
 #include "services/kovacontentextractd/readers/encoding.h"
 #include "services/kovacontentextractd/readers/markup.h"

@@ -2,7 +2,7 @@
 
 #include "services/kovacontentextractd/readers/photo/photo.h"
 
-#include "services/kovacontentextractd/readers/encoding.h"
+#include "services/kovacontentextractd/readers/converters.h"
 #include "services/kovacontentextractd/worker.h"
 
 using namespace ferrox::extract;

@@ -11,8 +11,8 @@
 #include <string_view>
 
 #include "services/kovacontentextractd/readers/code_pages.h"
+#include "services/kovacontentextractd/readers/converters.h"
 #include "services/kovacontentextractd/readers/cpu_budget.h"
-#include "services/kovacontentextractd/readers/encoding.h"
 #include "services/kovacontentextractd/readers/mapped_file.h"
 #include "services/kovacontentextractd/readers/pdf/character_tables.h"
 #include "services/kovacontentextractd/readers/pdf/xmp_packet.h"
