@@ -1,15 +1,17 @@
 #include "services/kovacontentextractd/readers/photo/photo.h"
 
+#include <algorithm>
 #include <cmath>
 #include <exception>
 #include <exiv2/exiv2.hpp>
 #include <new>
+#include <span>
 #include <string>
 
-#include "services/kovacontentextractd/readers/latin1.h"
 #include "services/kovacontentextractd/readers/mapped_file.h"
 #include "services/kovacontentextractd/readers/photo/gif.h"
 #include "services/kovacontentextractd/readers/photo/heif.h"
+#include "services/kovacontentextractd/readers/photo/photo_fields.h"
 #include "services/kovacontentextractd/readers/photo/png.h"
 #include "services/kovacontentextractd/readers/times.h"
 
@@ -17,123 +19,8 @@ namespace ferrox::extract {
 
 namespace {
 
-enum class Kind { kText, kInteger, kNumber, kShown };
-
-// Cameras write EXIF, a TIFF file of numbered tags; news agencies IPTC, numbered records; programs XMP, properties in
-// XML. A file may have all three, saying the same or not. The library finds and parses them in each container; what is
-// decided here is which of them fills a field.
-
-/// Which key of the library fills which field, and how.
-struct Row {
-  const char* key;
-  const char* field;
-  Kind kind = Kind::kText;  ///< kShown: in the words that the library has for the number
-};
-
-// Of several rows for a field that is no list, the first one that the file has counts.
-constexpr Row kExifRows[] = {
-    {"Exif.Image.Make", field::kKOVAMDAcquisitionMake},
-    {"Exif.Image.Model", field::kKOVAMDAcquisitionModel},
-    {"Exif.Image.UniqueCameraModel", field::kKOVAMDAcquisitionModel},
-    {"Exif.Image.Software", field::kKOVAMDCreator},
-    {"Exif.Image.ImageDescription", field::kKOVAMDDescription},
-    {"Exif.Image.Copyright", field::kKOVAMDCopyright},
-    {"Exif.Image.Artist", field::kKOVAMDAuthors},
-    {"Exif.Image.Orientation", field::kKOVAMDOrientation, Kind::kInteger},
-    {"Exif.Image.XPTitle", field::kKOVAMDTitle, Kind::kShown},
-    {"Exif.Image.XPComment", field::kKOVAMDComment, Kind::kShown},
-    {"Exif.Image.XPKeywords", field::kKOVAMDKeywords, Kind::kShown},
-    {"Exif.Image.XPAuthor", field::kKOVAMDAuthors, Kind::kShown},
-    {"Exif.Image.Rating", field::kKOVAMDStarRating, Kind::kShown},
-    {"Exif.Photo.UserComment", field::kKOVAMDComment},
-    {"Exif.Photo.ExposureTime", field::kKOVAMDExposureTimeSeconds, Kind::kNumber},
-    {"Exif.Photo.FNumber", field::kKOVAMDFNumber, Kind::kNumber},
-    {"Exif.Photo.FNumber", field::kKOVAMDAperture, Kind::kShown},
-    {"Exif.Photo.MaxApertureValue", field::kKOVAMDMaxAperture, Kind::kNumber},
-    {"Exif.Photo.FocalLength", field::kKOVAMDFocalLength, Kind::kNumber},
-    {"Exif.Photo.ExposureProgram", field::kKOVAMDExposureProgram, Kind::kShown},
-    {"Exif.Photo.ExposureMode", field::kKOVAMDExposureMode, Kind::kShown},
-    {"Exif.Photo.MeteringMode", field::kKOVAMDMeteringMode, Kind::kShown},
-    {"Exif.Photo.WhiteBalance", field::kKOVAMDWhiteBalance, Kind::kShown},
-    {"Exif.Photo.ColorSpace", field::kKOVAMDColorSpace, Kind::kShown},
-    {"Exif.Photo.ExifVersion", field::kKOVAMDEXIFVersion, Kind::kShown},
-    {"Exif.Image.BitsPerSample", field::kKOVAMDBitsPerSample, Kind::kInteger},
-};
-
-constexpr Row kIptcRows[] = {
-    {"Iptc.Application2.ObjectName", field::kKOVAMDTitle},
-    {"Iptc.Application2.Headline", field::kKOVAMDHeadline},
-    {"Iptc.Application2.Caption", field::kKOVAMDDescription},
-    {"Iptc.Application2.Keywords", field::kKOVAMDKeywords},
-    {"Iptc.Application2.Byline", field::kKOVAMDAuthors},
-    {"Iptc.Application2.Copyright", field::kKOVAMDCopyright},
-    {"Iptc.Application2.SpecialInstructions", field::kKOVAMDInstructions},
-    {"Iptc.Application2.SubLocation", field::kKOVAMDNamedLocation},
-    {"Iptc.Application2.City", field::kKOVAMDCity},
-    {"Iptc.Application2.ProvinceState", field::kKOVAStateOrProvince},
-    {"Iptc.Application2.CountryName", field::kKOVAMDCountry},
-};
-
-constexpr Row kXmpRows[] = {
-    {"Xmp.dc.title", field::kKOVAMDTitle},
-    {"Xmp.photoshop.Headline", field::kKOVAMDHeadline},
-    {"Xmp.dc.description", field::kKOVAMDDescription},
-    {"Xmp.dc.subject", field::kKOVAMDKeywords},
-    {"Xmp.dc.creator", field::kKOVAMDAuthors},
-    {"Xmp.dc.rights", field::kKOVAMDCopyright},
-    {"Xmp.photoshop.Instructions", field::kKOVAMDInstructions},
-    {"Xmp.iptc.Location", field::kKOVAMDNamedLocation},
-    {"Xmp.photoshop.City", field::kKOVAMDCity},
-    {"Xmp.photoshop.State", field::kKOVAStateOrProvince},
-    {"Xmp.photoshop.Country", field::kKOVAMDCountry},
-    {"Xmp.iptcExt.PersonInImage", field::kKOVAMDPeopleDisplayName},
-    {"Xmp.xmp.Rating", field::kKOVAMDStarRating},
-    {"Xmp.xmp.CreatorTool", field::kKOVAMDCreator},
-};
-
-/// What programs copy out of EXIF, and in some files is all that is left of it.
-constexpr Row kCopiedRows[] = {
-    {"Xmp.tiff.Make", field::kKOVAMDAcquisitionMake},
-    {"Xmp.tiff.Model", field::kKOVAMDAcquisitionModel},
-    {"Xmp.exif.UserComment", field::kKOVAMDComment},
-};
-
-/// Fields of several values, to which each source adds.
-bool IsList(const std::string& name) {
-  return name == field::kKOVAMDKeywords || name == field::kKOVAMDAuthors || name == field::kKOVAMDPeopleDisplayName;
-}
-
-/// Collects fields so that of several sources the first one counts, and lists are joined.
-class Fields {
- public:
-  explicit Fields(Findings& findings) : findings_(findings) {}
-
-  void Add(const char* field, const std::string& text) {
-    const std::string clean = Cleaned(text);
-    if (clean.empty()) return;
-    if (IsList(field)) return findings_.Append(field, clean);
-    if (values_.isMember(field)) return;
-    values_[field] = clean;
-    findings_.Set(field, clean);
-  }
-  std::string Value(const char* field) const { return values_.get(field, "").asString(); }
-
- private:
-  /// Without blanks at the end, which cameras fill up with; what is not UTF-8 is read as Latin-1, unless it looks like
-  /// Cyrillic or East Asian text.
-  static std::string Cleaned(std::string text) {
-    text.resize(text.find_last_not_of(std::string_view("\0 \t\r\n", 5)) + 1);
-    const std::string clean = Utf8OrLatin1(text);
-    const std::string encoding = clean != text ? TrueEncoding(clean) : std::string();
-    return encoding.empty() ? clean : InTrueEncoding(clean, encoding);
-  }
-
-  Findings& findings_;
-  Json::Value values_;
-};
-
 /// The items of a value one by one: lists of names, texts in several languages.
-void AddValue(const Row& row, const Exiv2::Value& value, Fields& fields) {
+void AddValue(const PhotoRow& row, const Exiv2::Value& value, PhotoFields& fields) {
   constexpr long kItemsMax = 1000;
   const auto* comment = dynamic_cast<const Exiv2::CommentValue*>(&value);
   if (comment != nullptr) return fields.Add(row.field, comment->comment());
@@ -153,15 +40,15 @@ double NumberOf(const Exiv2::Exifdatum& datum) {
 }
 
 /// The rows of EXIF, and the numbers that only it has.
-void AddExif(const Exiv2::ExifData& exif, Fields& fields, Findings& findings) {
-  for (const Row& row : kExifRows) {
+void AddExif(const Exiv2::ExifData& exif, PhotoFields& fields, Findings& findings) {
+  for (const PhotoRow& row : ExifRows()) {
     const auto found = exif.findKey(Exiv2::ExifKey(row.key));
     if (found == exif.end() || found->count() == 0) continue;
-    if (row.kind == Kind::kInteger) {
+    if (row.kind == PhotoRow::kInteger) {
       findings.SetInteger(row.field, found->toLong());
-    } else if (row.kind == Kind::kNumber) {
+    } else if (row.kind == PhotoRow::kNumber) {
       findings.SetNumber(row.field, NumberOf(*found));
-    } else if (row.kind == Kind::kShown) {
+    } else if (row.kind == PhotoRow::kShown) {
       fields.Add(row.field, found->print(&exif));
     } else {
       AddValue(row, found->value(), fields);
@@ -170,9 +57,9 @@ void AddExif(const Exiv2::ExifData& exif, Fields& fields, Findings& findings) {
 }
 
 /// The rows of IPTC or XMP. A key may occur several times, each with a value of its list.
-template <typename Data, typename Key, size_t Count>
-void AddRows(const Data& data, const Row (&rows)[Count], Fields& fields) {
-  for (const Row& row : rows) {
+template <typename Key, typename Data>
+void AddRows(const Data& data, std::span<const PhotoRow> rows, PhotoFields& fields) {
+  for (const PhotoRow& row : rows) {
     const Key key(row.key);
     for (const auto& datum : data) {
       if (datum.key() == key.key()) AddValue(row, datum.value(), fields);
@@ -258,7 +145,7 @@ void AddPixels(const Exiv2::Image& image, Findings& findings) {
 }
 
 /// Names that programs give faces, and places that they write in several parts.
-void AddNamedParts(const Exiv2::XmpData& xmp, Fields& fields) {
+void AddNamedParts(const Exiv2::XmpData& xmp, PhotoFields& fields) {
   static constexpr struct {
     const char* within;
     const char* end;
@@ -280,7 +167,7 @@ void AddNamedParts(const Exiv2::XmpData& xmp, Fields& fields) {
 }
 
 /// The names of the place together, from the nearest to the widest.
-void AddPlace(const Fields& fields, Findings& findings) {
+void AddPlace(const PhotoFields& fields, Findings& findings) {
   std::string place;
   for (const char* part :
        {field::kKOVAMDNamedLocation, field::kKOVAMDCity, field::kKOVAStateOrProvince, field::kKOVAMDCountry}) {
@@ -290,7 +177,7 @@ void AddPlace(const Fields& fields, Findings& findings) {
   findings.Set(field::kKOVAMDNamedLocation, place);
 }
 
-void AddGifTexts(std::string_view file, Exiv2::Image& image, Fields& fields) {
+void AddGifTexts(std::string_view file, Exiv2::Image& image, PhotoFields& fields) {
   const GifTexts texts = ReadGifTexts(file);
   if (!texts.xmp.empty()) (void)Exiv2::XmpParser::decode(image.xmpData(), texts.xmp);
   fields.Add(field::kKOVAMDComment, texts.comment);
@@ -306,7 +193,7 @@ void AddHeifParts(std::string_view file, Exiv2::Image& image) {
   if (!parts.xmp.empty() && image.xmpData().empty()) (void)Exiv2::XmpParser::decode(image.xmpData(), parts.xmp);
 }
 
-void AddPngTexts(const PngParts& parts, Fields& fields) {
+void AddPngTexts(const PngParts& parts, PhotoFields& fields) {
   static constexpr std::pair<std::string_view, const char*> kKeywords[] = {
       {"Title", field::kKOVAMDTitle},
       {"Author", field::kKOVAMDAuthors},
@@ -334,16 +221,16 @@ void ReadImage(std::string_view file, const PngParts& png, Findings& findings) {
   } catch (const Exiv2::AnyError&) {
     findings.Fail("damaged");  // what was read until then holds
   }
-  Fields fields(findings);
+  PhotoFields fields(findings);
   AddPixels(*image, findings);
   AddHeifParts(file, *image);
   if (image->mimeType() == "image/gif") AddGifTexts(file, *image, fields);
   // What people wrote with programs counts more than what cameras put there.
-  AddRows<Exiv2::XmpData, Exiv2::XmpKey>(image->xmpData(), kXmpRows, fields);
+  AddRows<Exiv2::XmpKey>(image->xmpData(), XmpRows(), fields);
   AddNamedParts(image->xmpData(), fields);
-  AddRows<Exiv2::IptcData, Exiv2::IptcKey>(image->iptcData(), kIptcRows, fields);
+  AddRows<Exiv2::IptcKey>(image->iptcData(), IptcRows(), fields);
   AddExif(image->exifData(), fields, findings);
-  AddRows<Exiv2::XmpData, Exiv2::XmpKey>(image->xmpData(), kCopiedRows, fields);
+  AddRows<Exiv2::XmpKey>(image->xmpData(), CopiedRows(), fields);
   AddPngTexts(png, fields);
   fields.Add(field::kKOVAMDComment, image->comment());
   AddTimes(*image, findings);
