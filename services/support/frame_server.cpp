@@ -11,19 +11,17 @@
 #include <unistd.h>
 
 #include <algorithm>
-#include <array>
 #include <atomic>
 #include <cerrno>
 #include <cstring>
 #include <memory>
-#include <optional>
 #include <thread>
 #include <unordered_map>
 #include <vector>
 
 #include "base/mutex.h"
 #include "common/log.h"
-#include "services/support/descriptor_passing.h"
+#include "services/support/frame_connection.h"
 
 namespace ferrox::services {
 
@@ -31,8 +29,6 @@ namespace {
 
 using SteadyClock = std::chrono::steady_clock;
 
-constexpr size_t kHeaderBytes = 4;
-constexpr size_t kReadChunkBytes = 64 * 1024;
 constexpr uint64_t kListenId = 0;
 constexpr uint64_t kStopId = 1;
 constexpr uint64_t kFirstConnectionId = 2;
@@ -79,99 +75,6 @@ Peer PeerOf(int fd) {
   if (getsockopt(fd, SOL_SOCKET, SO_PEERCRED, &credentials, &size) != 0) return {static_cast<uid_t>(-1)};
   return {credentials.uid, credentials.gid, credentials.pid};
 }
-
-enum class Progress { kMore, kComplete, kBroken };
-using Chunk = std::array<char, kReadChunkBytes>;
-
-/// One client and where its present frame stands: a request is received whole, answered, its reply sent whole, and the
-/// next one received.
-struct Connection {
-  enum class State { kReceiving, kSending };
-
-  uint64_t id = 0;
-  base::UniqueFd fd;
-  Peer peer;
-  base::UniqueFd descriptor;  ///< peer.descriptor
-  bool busy = false;          ///< a thread is at work on it
-  State state = State::kReceiving;
-  std::array<char, kHeaderBytes> header = {};
-  std::string body;  ///< of the request as far as it has come, or of the reply
-  size_t done = 0;   ///< of header and body, received or sent
-  SteadyClock::time_point last_progress = SteadyClock::now();
-
-  /// The length of the body, once the header is there.
-  std::optional<uint32_t> BodyBytes() const {
-    uint32_t length = 0;
-    if (done < kHeaderBytes) return std::nullopt;
-    memcpy(&length, header.data(), kHeaderBytes);
-    return length;
-  }
-
-  ssize_t ReceiveBytes(void* to, size_t size, bool takes_descriptors) {
-    if (!takes_descriptors) return read(fd.Get(), to, size);
-    int received = -1;
-    const ssize_t got = ReceiveWithDescriptors(fd.Get(), to, size, &received, 1);
-    if (received >= 0) {
-      descriptor.Reset(received);
-      peer.descriptor = received;
-    }
-    return got;
-  }
-
-  /// Reads what is there, up to the end of the frame. Memory grows with what arrives, not with what is announced.
-  Progress Receive(const FrameServerOptions& options, Chunk& chunk) {
-    for (;;) {
-      const auto body_bytes = BodyBytes();
-      if (body_bytes && *body_bytes > options.request_limit_bytes) return Progress::kBroken;
-      const size_t missing = body_bytes ? *body_bytes - body.size() : kHeaderBytes - done;
-      if (missing == 0) return Progress::kComplete;
-      const ssize_t got = ReceiveBytes(chunk.data(), std::min(missing, chunk.size()), options.takes_descriptors);
-      if (got < 0 && errno == EINTR) continue;
-      if (got < 0 && errno == EAGAIN) return Progress::kMore;
-      if (got <= 0) return Progress::kBroken;
-      if (body_bytes) {
-        body.append(chunk.data(), static_cast<size_t>(got));
-      } else {
-        memcpy(header.data() + done, chunk.data(), static_cast<size_t>(got));
-      }
-      done += static_cast<size_t>(got);
-      last_progress = SteadyClock::now();
-    }
-  }
-
-  void BeginSending(std::string reply) {
-    const auto length = static_cast<uint32_t>(reply.size());
-    memcpy(header.data(), &length, kHeaderBytes);
-    body = std::move(reply);
-    state = State::kSending;
-    done = 0;
-    last_progress = SteadyClock::now();
-  }
-
-  void BeginReceiving() {
-    std::string().swap(body);
-    state = State::kReceiving;
-    done = 0;
-  }
-
-  Progress Send() {
-    while (done < kHeaderBytes + body.size()) {
-      const size_t of_header = std::min(done, kHeaderBytes), of_body = done - of_header;
-      iovec parts[] = {{header.data() + of_header, kHeaderBytes - of_header},
-                       {body.data() + of_body, body.size() - of_body}};
-      msghdr message = {};
-      message.msg_iov = parts;
-      message.msg_iovlen = 2;
-      const ssize_t put = sendmsg(fd.Get(), &message, MSG_NOSIGNAL);
-      if (put < 0 && errno == EINTR) continue;
-      if (put < 0 && errno == EAGAIN) return Progress::kMore;
-      if (put < 0) return Progress::kBroken;
-      done += static_cast<size_t>(put);
-      last_progress = SteadyClock::now();
-    }
-    return Progress::kComplete;
-  }
-};
 
 }  // namespace
 
@@ -224,7 +127,9 @@ class FrameServer::Impl {
   }
 
  private:
-  using Connections = std::unordered_map<uint64_t, std::unique_ptr<Connection>>;
+  using Chunk = FrameConnection::Chunk;
+  using Progress = FrameConnection::Progress;
+  using Connections = std::unordered_map<uint64_t, std::unique_ptr<FrameConnection>>;
   enum class Next { kReceive, kSend, kEnd };
 
   static void Watch(const base::UniqueFd& epoll, int operation, int fd, uint64_t id, uint32_t events) {
@@ -255,7 +160,7 @@ class FrameServer::Impl {
   }
 
   void Add(base::UniqueFd fd) BASE_REQUIRES(mutex_) {
-    auto connection = std::make_unique<Connection>();
+    auto connection = std::make_unique<FrameConnection>();
     connection->id = next_id_++;
     connection->peer = PeerOf(fd.Get());
     connection->fd = std::move(fd);
@@ -269,12 +174,12 @@ class FrameServer::Impl {
     while (!stop_) {
       epoll_event event = {};
       if (epoll_wait(ready_.Get(), &event, 1, -1) != 1 || event.data.u64 == kStopId) continue;
-      if (Connection* connection = Take(event.data.u64)) Give(*connection, Advance(*connection, chunk));
+      if (FrameConnection* connection = Take(event.data.u64)) Give(*connection, Advance(*connection, chunk));
     }
   }
 
   /// A connection for the calling thread alone; null when it has been ended.
-  Connection* Take(uint64_t id) {
+  FrameConnection* Take(uint64_t id) {
     const base::MutexLock lock(mutex_);
     const auto it = connections_.find(id);
     if (it == connections_.end()) return nullptr;
@@ -282,7 +187,7 @@ class FrameServer::Impl {
     return it->second.get();
   }
 
-  void Give(Connection& connection, Next next) {
+  void Give(FrameConnection& connection, Next next) {
     const base::MutexLock lock(mutex_);
     connection.busy = false;
     if (next == Next::kEnd) {
@@ -296,8 +201,8 @@ class FrameServer::Impl {
   /// Receives, answers and sends as far as it goes without waiting for the peer. The connection is the calling
   /// thread's.
   /// @return what the connection waits for next.
-  Next Advance(Connection& connection, Chunk& chunk) try {
-    if (connection.state == Connection::State::kReceiving) {
+  Next Advance(FrameConnection& connection, Chunk& chunk) try {
+    if (connection.state == FrameConnection::State::kReceiving) {
       const size_t before = connection.body.size();
       const Progress progress = connection.Receive(options_, chunk);
       const uint64_t added = connection.body.size() - before;
@@ -319,8 +224,8 @@ class FrameServer::Impl {
     return Next::kEnd;
   }
 
-  void End(Connection& connection) BASE_REQUIRES(mutex_) {
-    if (connection.state == Connection::State::kReceiving) request_bytes_ -= connection.body.size();
+  void End(FrameConnection& connection) BASE_REQUIRES(mutex_) {
+    if (connection.state == FrameConnection::State::kReceiving) request_bytes_ -= connection.body.size();
     if (connection.descriptor.Valid()) options_.on_end(connection.descriptor.Get());
     connections_.erase(connection.id);
   }
@@ -331,14 +236,14 @@ class FrameServer::Impl {
     next_idle_check_ = now + std::chrono::milliseconds(kTickMs);
     const base::MutexLock lock(mutex_);
     for (auto it = connections_.begin(); it != connections_.end();) {
-      Connection& current = *it++->second;
+      FrameConnection& current = *it++->second;
       if (!current.busy && now - current.last_progress > options_.idle_timeout) End(current);
     }
   }
 
   /// Makes room for a new connection: the one without progress for the longest time goes. False when all are at work.
   bool EndLongestIdle() BASE_REQUIRES(mutex_) {
-    Connection* longest = nullptr;
+    FrameConnection* longest = nullptr;
     for (const auto& [id, connection] : connections_) {
       if (connection->busy) continue;
       if (longest == nullptr || connection->last_progress < longest->last_progress) longest = connection.get();
