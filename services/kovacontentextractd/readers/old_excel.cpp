@@ -6,6 +6,7 @@
 
 #include "services/kovacontentextractd/readers/cell_numbers.h"
 #include "services/kovacontentextractd/readers/code_pages.h"
+#include "services/kovacontentextractd/readers/excel_records.h"
 #include "services/kovacontentextractd/readers/little_endian.h"
 #include "services/kovacontentextractd/readers/old_office_parts.h"
 
@@ -13,156 +14,18 @@ namespace ferrox::extract {
 
 namespace {
 
-// BIFF, the format of Excel's files from 2 to 2003, is a row of records: a type (2 bytes), the size of the content (2
-// bytes, at most 8224 in BIFF8), the content. All numbers have their low byte first. Since Excel 5 the records are the
-// stream "Workbook" or "Book" of a compound file; before, they are the file itself. Read are: cells, notes, texts of
-// drawings and charts, names of sheets; of formulas the result, never the expression.
-enum BookRecord : uint16_t {
-  kBof2 = 0x0009,  // of Excel 2, and what follows it: of 3 and 4
-  kBof3 = 0x0209,
-  kBof4 = 0x0409,
-  kBof = 0x0809,
-  kFilePass = 0x002F,
-  kCodePage = 0x0042,
-  kDateMode = 0x0022,
-  kBoundSheet = 0x0085,
-  kSharedTexts = 0x00FC,
-  kContinue = 0x003C,
-  kFormat = 0x041E,
-  kExtendedFormat = 0x00E0,
-  kLabel = 0x0204,
-  kRichLabel = 0x00D6,
-  kNumber = 0x0203,
-  kShortNumber = 0x027E,
-  kShortNumbers = 0x00BD,
-  kFormula = 0x0006,
-  kFormula3 = 0x0206,
-  kFormula4 = 0x0406,
-  kFormulaText = 0x0207,
-  kFormulaText2 = 0x0007,
-  kInteger2 = 0x0002,
-  kNumber2 = 0x0003,
-  kLabel2 = 0x0004,
-  kNote = 0x001C,
-  kTextObject = 0x01B6,
-  kSeriesText = 0x100D,
-};
 /// The version in a kBof record of Excel 97 and later: texts are in UTF-16, or in its low bytes where these are enough.
 /// Before, they are in the code page that kCodePage names.
 constexpr uint16_t kBiff8 = 0x0600;
 /// More formats or styles than a workbook may have.
 constexpr size_t kStylesMax = 65536;
 
-/// The records of a workbook, one at a time; of the last one, which may be cut off, what there is.
-class Records {
- public:
-  explicit Records(ByteSource& stream) : stream_(stream) {}
-
-  bool Next() {
-    std::string header(4, '\0');
-    if (stream_.Read(header.data(), 4) != 4) return false;
-    type_ = Little16(header, 0);
-    content_.resize(Little16(header, 2));
-    content_.resize(stream_.Read(content_.data(), content_.size()));
-    return true;
-  }
-  uint16_t Type() const { return type_; }
-  std::string_view Content() const { return content_; }
-
- private:
-  ByteSource& stream_;
-  uint16_t type_ = 0;
-  std::string content_;
-};
-
-/// The table of texts (SST), to which cells of BIFF8 refer by number. Text is taken in the table's order, so that no
-/// table has to be kept in memory: a search does not ask in which cell a word stands.
-///
-/// The first record has two counts of 4 bytes, of which the second is that of the texts; the table goes on in kContinue
-/// records. A text is: length in characters (2 bytes), flags (1 byte: 1 two bytes a character, 4 phonetic data, 8 runs
-/// of formats), the number of runs (2 bytes, with flag 8), the size of the phonetic data (4 bytes, with flag 4), the
-/// characters, then runs of 4 bytes and phonetic data, which are passed over. Where the end of a record cuts the
-/// characters, the next record begins with a new byte of flags.
-class SharedTexts {
- public:
-  SharedTexts(Records& records, Findings& findings) : records_(records), findings_(findings) {}
-
-  /// Leaves the first record behind the table as the current one; false when that is none, or no more text is taken.
-  bool Add() {
-    at_ = 8;
-    const uint32_t count = Little32(records_.Content(), 4);
-    for (uint32_t i = 0; i < count && in_table_; ++i) {
-      if (!AddText()) return false;
-    }
-    while (in_table_) NextRecord();
-    return !ended_;
-  }
-
- private:
-  void NextRecord() {
-    ended_ = !records_.Next();
-    in_table_ = !ended_ && records_.Type() == kContinue;
-    at_ = 0;
-  }
-
-  /// A number that no record cuts.
-  uint32_t Number(size_t size) {
-    if (at_ >= records_.Content().size()) NextRecord();
-    if (!in_table_) return 0;
-    const auto value = static_cast<uint32_t>(LittleEndian(records_.Content(), at_, size));
-    at_ += size;
-    return value;
-  }
-
-  bool AddText() {
-    const uint32_t length = Number(2);
-    uint32_t flags = Number(1);
-    const uint32_t runs = (flags & 8) != 0 ? Number(2) : 0;
-    const uint32_t extra = (flags & 4) != 0 ? Number(4) : 0;
-    bool more = true;
-    for (uint32_t left = length; left > 0 && in_table_;) {
-      if (at_ >= records_.Content().size()) {
-        NextRecord();
-        if (!in_table_) break;
-        flags = Number(1);
-      }
-      const size_t width = (flags & 1) != 0 ? 2 : 1;
-      const std::string_view rest = records_.Content().substr(std::min(at_, records_.Content().size()));
-      const auto count = static_cast<uint32_t>(std::min<size_t>(left, rest.size() / width));
-      if (count == 0) at_ = records_.Content().size();
-      const std::string_view bytes = rest.substr(0, count * width);
-      more = findings_.AddText(width == 2 ? FromUtf16Little(bytes) : FromCodePage(bytes, 1252));
-      at_ += bytes.size();
-      left -= count;
-    }
-    findings_.Break();
-    Skip(uint64_t{runs} * 4 + extra);
-    return more;
-  }
-
-  void Skip(uint64_t count) {
-    while (count > 0 && in_table_) {
-      const uint64_t left = records_.Content().size() - std::min(at_, records_.Content().size());
-      if (left >= count) {
-        at_ += static_cast<size_t>(count);
-        return;
-      }
-      count -= left;
-      NextRecord();
-    }
-  }
-
-  Records& records_;
-  Findings& findings_;
-  size_t at_ = 0;
-  bool in_table_ = true;
-  bool ended_ = false;
-};
-
 /// Reads a workbook of any version. All sheets of a book are one stream of records, so the row of a cell is all that is
 /// kept of its place: cells of one row are joined by tabs, in the order of the file.
 class WorkbookReader {
  public:
+  using enum ExcelRecords::RecordType;
+
   WorkbookReader(ByteSource& stream, Findings& findings) : records_(stream), findings_(findings) {}
 
   void Read() {
@@ -172,7 +35,7 @@ class WorkbookReader {
     cell_bytes_ = records_.Type() == kBof2 ? 7 : 6;  // Excel 2 has three bytes of attributes in place of a style
     while (have) {
       if (records_.Type() == kSharedTexts && biff8_) {
-        have = SharedTexts(records_, findings_).Add();
+        have = ExcelSharedTexts(records_, findings_).Add();
       } else {
         have = Take(records_.Content()) && records_.Next();
       }
@@ -335,7 +198,7 @@ class WorkbookReader {
     return more;
   }
 
-  Records records_;
+  ExcelRecords records_;
   Findings& findings_;
   bool biff8_ = true;
   bool from_1904_ = false;
