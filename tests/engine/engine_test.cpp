@@ -7,6 +7,7 @@
 #include <set>
 #include <vector>
 
+#include "services/kovaelasticd/store/sqlite_db.h"
 #include "tests/engine/engine_fixture.h"
 
 namespace ferrox::engine {
@@ -158,9 +159,7 @@ TEST_F(EngineTest, AnUnusableIndexDoesNotHideTheOthers) {
   ASSERT_EQ(Put("good", "/v/1", "lantern"), 0);
   ASSERT_EQ(Commit("good"), 0);
   engine_.reset();
-  std::string newer = test::ReadFile(folder_ / "bad/index.sqlite");
-  newer[63] = 99;  // the user version
-  test::WriteFile(folder_ / "bad/index.sqlite", newer);
+  Database(folder_ / "bad/index.sqlite", Database::Mode::kWrite).Execute("PRAGMA user_version = 99");
   Restart();
   const Json::Value reply = Send("search", R"({"id":"bad","query":"lantern"})");
   EXPECT_EQ(CodeOf(reply), 1407);

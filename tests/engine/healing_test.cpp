@@ -3,9 +3,11 @@
 #include <sys/stat.h>
 
 #include <functional>
+#include <thread>
 #include <vector>
 
 #include "common/error.h"
+#include "services/kovaelasticd/store/sqlite_db.h"
 #include "tests/engine/engine_fixture.h"
 #include "tests/support/fake_clock.h"
 
@@ -16,6 +18,7 @@ namespace fs = std::filesystem;
 
 class HealingTest : public EngineTest {
  protected:
+  ~HealingTest() override { engine_.reset(); }  // its threads ask the clock
   void SetUp() override {
     ASSERT_EQ(Create("a", "a"), 0);
     Fill();
@@ -39,6 +42,10 @@ class HealingTest : public EngineTest {
       if (entry.path().string().find(".damaged-") != std::string::npos) found.push_back(entry.path());
     }
     return found;
+  }
+  /// When the file was last read as a whole, or made; 0: not noted yet.
+  int64_t Scrubbed() {
+    return Database(file_, Database::Mode::kRead).QueryInt("SELECT value FROM info WHERE key = 'scrubbed'");
   }
   /// What it does with each page of the file.
   void ChangePages(const std::function<void(std::string& page)>& change) {
@@ -108,6 +115,21 @@ TEST_F(HealingTest, ADamagedOrLostIndexIsMadeAnewAndToldUntilItIsComplete) {
   }
 }
 
+TEST_F(HealingTest, DamageThatNoRequestReadsIsFoundWithinAWeek) {
+  EXPECT_EQ(Code("index_stat", R"({"id":"a"})"), 0);
+  while (Scrubbed() == 0) std::this_thread::yield();
+  engine_.reset();
+  std::string content = test::ReadFile(file_);
+  content[content.size() - 8192 * 3 + 4000] ^= 1;
+  test::WriteFile(file_, content);
+  Restart();
+  EXPECT_EQ(Code("index_stat", R"({"id":"a"})"), 0);
+  EXPECT_TRUE(Rebuilding().isNull());
+  clock_.now_ms += 8LL * 86400 * 1000;
+  while (Rebuilding().isNull()) (void)Commit("a");
+  EXPECT_EQ(Rebuilding()["since"], clock_.Now());
+}
+
 TEST_F(HealingTest, AfterTwoInADayItStopsUnlessItIsAsked) {
   for (int time = 0; time < 2; ++time) {
     WriteGarbage();
@@ -126,7 +148,7 @@ TEST_F(HealingTest, AfterTwoInADayItStopsUnlessItIsAsked) {
 
 TEST_F(HealingTest, WhatMayPassLeavesTheIndexAsItIs) {
   const std::string good = test::ReadFile(file_);
-  ChangePages([](std::string& page) { page.compare(0, 6, "SQLite") == 0 ? void(page[63] = 99) : void(); });
+  Database(file_, Database::Mode::kWrite).Execute("PRAGMA user_version = 99");
   Restart();
   EXPECT_NE(Refusal().find("format 99"), std::string::npos);
   fs::remove(file_);

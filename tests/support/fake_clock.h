@@ -1,5 +1,6 @@
 #pragma once
 
+#include <atomic>
 #include <vector>
 
 #include "common/clock.h"
@@ -20,7 +21,7 @@ class FakeClock : public Clock {
   int64_t Now() override { return now_ms / 1000; }
 
   std::vector<std::chrono::milliseconds> sleeps;
-  int64_t now_ms = 1700000000000;
+  std::atomic<int64_t> now_ms{1700000000000};
   void (*on_sleep)() = nullptr;
 
  private:

@@ -20,8 +20,9 @@ constexpr char kLostText[] =
 }  // namespace
 
 Index::Index(std::unique_ptr<IndexStore> store, std::string marker_path, std::chrono::milliseconds auto_commit_after,
-             std::function<void()> on_damage)
+             std::function<void()> on_damage, std::unique_ptr<Scrubber> scrubber)
     : store_(std::move(store)),
+      scrubber_(std::move(scrubber)),
       marker_path_(std::move(marker_path)),
       auto_commit_after_(auto_commit_after),
       on_damage_(std::move(on_damage)) {
@@ -81,16 +82,24 @@ void Index::Close() {
   }
   if (thread_.joinable()) thread_.join();
   const base::WriterLock guard(store_mutex_);
+  scrubber_.reset();  // the last connection that is closed empties the log, and removes it: the store's
   store_.reset();
 }
 
-/// Waits for tasks and takes all of them; none when the time for an automatic commit has come, or the end.
+/// When the thread has something to do without a task: an automatic commit, or else a turn of the scrubber.
+std::optional<SteadyClock::time_point> Index::NextOwnWork() const {
+  if (uncommitted_ > 0) return auto_commit_at_;
+  return scrubber_ == nullptr ? std::nullopt : std::optional(scrubber_->NextTurn());
+}
+
+/// Waits for tasks and takes all of them; none when it is time for NextOwnWork, or the end.
 std::deque<Index::Task*> Index::WaitForTasks() {
   const base::MutexLock lock(mutex_);
   while (!stopping_ && tasks_.empty()) {
-    if (uncommitted_ == 0) {
+    const auto own_work = NextOwnWork();
+    if (!own_work.has_value()) {
       wake_thread_.Wait(mutex_);
-    } else if (!wake_thread_.WaitUntil(mutex_, auto_commit_at_)) {
+    } else if (!wake_thread_.WaitUntil(mutex_, *own_work)) {
       break;
     }
   }
@@ -125,6 +134,7 @@ void Index::ThreadMain() {
                      (stop || SteadyClock::now() >= auto_commit_at_ || store_->UncommittedBytes() >= kAutoCommitBytes);
     if (due) CommitByItself();
     if (stop) return;
+    if (tasks.empty() && uncommitted_ == 0 && scrubber_ != nullptr) Scrub();
   }
 }
 
@@ -194,6 +204,14 @@ void Index::CommitByItself() {
     if (!lost_) Unmark();
   } catch (const std::exception&) {
     // Logged where it arose; the next commit that somebody asks for fails.
+  }
+}
+
+void Index::Scrub() {
+  try {
+    ReportingDamage([&] { scrubber_->Turn(); });
+  } catch (const std::exception&) {
+    // Logged where it arose. A damaged index is made anew with the next request to the engine.
   }
 }
 

@@ -6,11 +6,13 @@
 #include <exception>
 #include <functional>
 #include <memory>
+#include <optional>
 #include <string>
 #include <thread>
 
 #include "base/mutex.h"
 #include "services/kovaelasticd/store/index_store.h"
+#include "services/kovaelasticd/store/scrubber.h"
 
 namespace ferrox::engine {
 
@@ -19,17 +21,18 @@ namespace ferrox::engine {
 /// Changes of several callers share a transaction; a commit that several wait for is made once. What nobody commits is
 /// committed after a while, or after kAutoCommitBytes. When changes that were answered with success are lost (a full
 /// disk, or a process that died: a marker file beside the index tells), the next commit fails, so that the sender
-/// of the changes sends them again.
+/// of the changes sends them again. While the thread has nothing else to do, it has the scrubber look after the file.
 class Index {
  public:
   static constexpr std::chrono::milliseconds kAutoCommitAfter{5000};
   static constexpr int64_t kAutoCommitBytes = 64 << 20;
 
   /// `marker_path` is the file that exists while there are uncommitted changes. `on_damage` is called, by any thread,
-  /// when the store finds its file damaged.
+  /// when the store or the scrubber, which may be null, finds the file damaged.
   Index(
       std::unique_ptr<IndexStore> store, std::string marker_path,
-      std::chrono::milliseconds auto_commit_after = kAutoCommitAfter, std::function<void()> on_damage = [] {});
+      std::chrono::milliseconds auto_commit_after = kAutoCommitAfter, std::function<void()> on_damage = [] {},
+      std::unique_ptr<Scrubber> scrubber = nullptr);
   Index(const Index&) = delete;
   Index& operator=(const Index&) = delete;
   /// Commits and closes.
@@ -66,12 +69,14 @@ class Index {
   /// Queues a task and waits until it is done.
   void Submit(Kind kind, const Job* job);
   void ThreadMain();
+  std::optional<std::chrono::steady_clock::time_point> NextOwnWork() const;
   std::deque<Task*> WaitForTasks();
   void Execute(Task& task);
   void RunChange(Task& task);
   void CommitFor(const std::deque<Task*>& waiting);
   void CommitByItself();
   void CommitStore();
+  void Scrub();
   void LoseChanges();
   void Mark();
   void Unmark();
@@ -82,6 +87,7 @@ class Index {
   /// the store, uses it without: Close waits for its end first.
   base::SharedMutex store_mutex_;
   std::unique_ptr<IndexStore> store_;
+  std::unique_ptr<Scrubber> scrubber_;  ///< of the thread alone, until Close
   const std::string marker_path_;
   const std::chrono::milliseconds auto_commit_after_;
   const std::function<void()> on_damage_;

@@ -33,11 +33,13 @@ Registry::~Registry() = default;
 void Registry::OpenSlot(IndexSlot& slot, const std::string& path, bool create) {
   if (slot.index != nullptr) return;
   auto store = std::make_unique<SqliteStore>(IndexFile(path), create, slot.schema);
-  slot.index = std::make_shared<Index>(std::move(store), MarkerFile(path), Index::kAutoCommitAfter,
-                                       [this, damaged = slot.damaged] {
-                                         *damaged = true;
-                                         any_damaged_ = true;
-                                       });
+  slot.index = std::make_shared<Index>(
+      std::move(store), MarkerFile(path), Index::kAutoCommitAfter,
+      [this, damaged = slot.damaged] {
+        *damaged = true;
+        any_damaged_ = true;
+      },
+      std::make_unique<Scrubber>(IndexFile(path)));
 }
 
 /// Commits and closes; searches that run finish first.

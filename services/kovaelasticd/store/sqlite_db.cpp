@@ -1,22 +1,24 @@
 #include "services/kovaelasticd/store/sqlite_db.h"
 
 #include "common/log.h"
+#include "services/kovaelasticd/store/checksum_vfs.h"
+#include "services/kovaelasticd/store/page_checksums.h"
 
 namespace ferrox::engine {
 
 namespace {
 
-/// By the primary code, which is the low byte of an extended one.
-bool IsDamage(int result) { return (result & 0xFF) == SQLITE_CORRUPT || (result & 0xFF) == SQLITE_NOTADB; }
+/// By the primary code, which is the low byte of an extended one, except for a page whose checksum is wrong.
+bool IsDamage(int result) {
+  return result == SQLITE_IOERR_DATA || (result & 0xFF) == SQLITE_CORRUPT || (result & 0xFF) == SQLITE_NOTADB;
+}
 
 /// What a person can do about it, the end of the error's sentence.
 std::string Remedy(int result) {
+  if (IsDamage(result)) return "the file is damaged; the index is made anew";
   switch (result & 0xFF) {
     case SQLITE_FULL:
       return "the disk is full; free space and try again";
-    case SQLITE_CORRUPT:
-    case SQLITE_NOTADB:
-      return "the file is damaged; the index is made anew";
     case SQLITE_CANTOPEN:
       return "it cannot be opened; check that it is a file, and that its folder exists and belongs to the engine's "
              "user";
@@ -90,9 +92,11 @@ Database::Database(const std::string& path, Mode mode) : path_(path) {
   // Readers write too: the wal-index, and recovery after a crash.
   flags |= mode == Mode::kCreate ? SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE : SQLITE_OPEN_READWRITE;
   sqlite3* opened = nullptr;
-  const int result = sqlite3_open_v2(path.c_str(), &opened, flags, nullptr);
+  const int result = sqlite3_open_v2(path.c_str(), &opened, flags, ChecksumVfs());
   handle_.reset(opened);
   Check(result);
+  int reserved = kChecksumBytes;  // a file that has its first table already keeps what it has
+  Check(sqlite3_file_control(opened, nullptr, SQLITE_FCNTL_RESERVE_BYTES, &reserved));
   (void)sqlite3_busy_timeout(opened, kBusyTimeoutMs);
 }
 
@@ -117,6 +121,10 @@ void Database::Execute(const char* sql) { Check(sqlite3_exec(handle_.get(), sql,
 int64_t Database::QueryInt(const char* sql) {
   Statement statement = Prepare(sql);
   return statement.Step() ? statement.Int(0) : 0;
+}
+
+void Database::CheckDamage(int result) {
+  if (IsDamage(result)) Fail(result);
 }
 
 void Database::Fail(int result) {

@@ -12,7 +12,8 @@
 
 namespace ferrox::engine {
 
-/// Of SQLite's failures the one that time does not mend: the file's content is damaged, or no database.
+/// Of SQLite's failures the one that time does not mend: the file's content is damaged, by a page's checksum or by what
+/// it holds, or no database.
 class IndexDamaged : public Error {
  public:
   explicit IndexDamaged(const std::string& reason) : Error(Error::kEngineStorage, reason) {}
@@ -61,7 +62,8 @@ class Statement {
   sqlite3_stmt* statement_;
 };
 
-/// One connection to one database file. For one thread at a time.
+/// One connection to one database file, whose pages have checksums when it was made by this class (checksum_vfs.h). For
+/// one thread at a time.
 class Database {
  public:
   /// kCreate makes a missing file. kRead is opened for writing too, which the write-ahead log needs; its user forbids
@@ -96,6 +98,8 @@ class Database {
     if (result != SQLITE_OK) [[unlikely]]
       Fail(result);
   }
+  /// For a call whose other failures may pass: fails when it has met damage.
+  void CheckDamage(int result);
 
  private:
   struct Closer {

@@ -80,9 +80,9 @@ void SqliteStore::Commit() {
 void SqliteStore::ShortenLog() {
   if (BytesOnDisk(writer_.Path() + "-wal") < kLogMaxBytes) return;
   (void)sqlite3_busy_timeout(writer_.Handle(), 0);
-  // What fails here is tried again with the next transaction.
-  (void)sqlite3_wal_checkpoint_v2(writer_.Handle(), nullptr, SQLITE_CHECKPOINT_TRUNCATE, nullptr, nullptr);
+  const int result = sqlite3_wal_checkpoint_v2(writer_.Handle(), nullptr, SQLITE_CHECKPOINT_TRUNCATE, nullptr, nullptr);
   (void)sqlite3_busy_timeout(writer_.Handle(), Database::kBusyTimeoutMs);
+  writer_.CheckDamage(result);  // what else fails is tried again with the next transaction
 }
 
 void SqliteStore::Rollback() {
