@@ -62,7 +62,14 @@ std::string FromCodePage(std::string_view bytes, int code_page) {
   DecodedText decoded;
   if (!name.empty() && code_page != 1252 && Decode(bytes, true, name, decoded)) return decoded.text;
   std::string out;
-  for (const char c : bytes) AppendUtf8(out, FromWindows1252(static_cast<unsigned char>(c)));
+  while (!bytes.empty()) {
+    const auto* other = std::find_if(bytes.begin(), bytes.end(), [](char c) { return (c & 0x80) != 0; });
+    out.append(bytes.begin(), other);
+    bytes.remove_prefix(static_cast<size_t>(other - bytes.begin()));
+    if (bytes.empty()) break;
+    AppendUtf8(out, FromWindows1252(static_cast<unsigned char>(bytes.front())));
+    bytes.remove_prefix(1);
+  }
   return out;
 }
 

@@ -61,7 +61,8 @@ class RichTextReader {
       } else if (c == '\\') {
         ReadControl();
       } else if (c != '\r' && c != '\n') {
-        AddByte(static_cast<char>(c));
+        input_.Unget();
+        AddBytes(input_.GetText());
       }
     }
     FlushBytes();
@@ -98,8 +99,9 @@ class RichTextReader {
   void ReadControl() {
     const int c = input_.Get();
     if (c == '\'') {
-      const int byte = input_.ReadHexByte();
-      if (byte >= 0) AddByte(static_cast<char>(byte));
+      const int value = input_.ReadHexByte();
+      const auto byte = static_cast<char>(value);
+      if (value >= 0) AddBytes({&byte, 1});
     } else if (RichTextInput::BeginsWord(c)) {
       const RichTextInput::Word word = input_.ReadWord(c);
       Do(word.name, word.number);
@@ -109,7 +111,8 @@ class RichTextReader {
   }
 
   void ReadSymbol(int c) {
-    if (c == '\\' || c == '{' || c == '}') return AddByte(static_cast<char>(c));
+    const auto byte = static_cast<char>(c);
+    if (c == '\\' || c == '{' || c == '}') return AddBytes({&byte, 1});
     if (c == '~') return AddCharacter(' ');
     if (c == '_') return AddCharacter('-');
     if (c == '\r' || c == '\n') return AddCharacter('\n');
@@ -199,22 +202,25 @@ class RichTextReader {
     if (const auto seconds = ToSeconds(time)) findings_.SetInteger(field::kKOVAMDContentCreationDate, *seconds);
   }
 
-  /// A byte of text, in the code page of the group.
-  void AddByte(char byte) {
-    if (fallback_left_ > 0) {
-      --fallback_left_;
-      return;
-    }
+  /// Text in the code page of the group.
+  void AddBytes(std::string_view bytes) {
+    const size_t dropped = std::min(fallback_left_, bytes.size());
+    fallback_left_ -= dropped;
+    bytes.remove_prefix(dropped);
     if (Top().target == Target::kNowhere || Top().target == Target::kFontTable) return;
-    bytes_ += byte;
-    if (bytes_.size() >= kRichPieceBytes) FlushBytes();
+    while (!bytes.empty()) {
+      const size_t taken = std::min(bytes.size(), kRichPieceBytes - bytes_.size());
+      bytes_ += bytes.substr(0, taken);
+      bytes.remove_prefix(taken);
+      if (bytes_.size() == kRichPieceBytes) FlushBytes();
+    }
   }
 
   /// "\u": one unit of UTF-16; characters beyond U+FFFF are two of them.
   void AddUnicode(int number) {
     FlushBytes();
     const auto unit = static_cast<uint16_t>(number);  // written as a signed number
-    fallback_left_ = Top().unicode_fallback;
+    fallback_left_ = static_cast<size_t>(Top().unicode_fallback);
     if ((unit & 0xFC00) == 0xD800) {
       high_surrogate_ = unit;
     } else if ((unit & 0xFC00) == 0xDC00 && high_surrogate_ != 0) {
@@ -264,7 +270,7 @@ class RichTextReader {
   int font_ = 0;              ///< the one in the table that is being read
   int ansi_code_page_ = 1252;
   bool optional_ = false;        ///< "\*" stood before: a word that is not known makes its group one to be dropped
-  int fallback_left_ = 0;        ///< bytes that are to be dropped behind a "\u"
+  size_t fallback_left_ = 0;     ///< bytes that are to be dropped behind a "\u"
   uint32_t high_surrogate_ = 0;  ///< the first half of a character, while its second one is to come
   std::string bytes_;            ///< in the group's code page
   std::string text_;

@@ -20,6 +20,14 @@ void RichTextInput::Refill() {
   at_ = 0;
 }
 
+std::string_view RichTextInput::GetText() {
+  const char* begin = buffer_.data() + at_;
+  const char* end = std::find_if(begin, static_cast<const char*>(buffer_.data()) + size_,
+                                 [](char c) { return c == '{' || c == '}' || c == '\\' || c == '\r' || c == '\n'; });
+  at_ += static_cast<size_t>(end - begin);
+  return {begin, static_cast<size_t>(end - begin)};
+}
+
 void RichTextInput::Skip(int count) {
   if (count <= 0) return;
   const size_t here = std::min(static_cast<size_t>(count), size_ - at_);
@@ -29,10 +37,12 @@ void RichTextInput::Skip(int count) {
 
 RichTextInput::Word RichTextInput::ReadWord(int first) {
   Word word;
+  size_t letters = 0;
   int next = first;
   for (; BeginsWord(next); next = Get()) {
-    if (word.name.size() < 32) word.name += static_cast<char>(next);
+    if (letters < name_.size()) name_[letters++] = static_cast<char>(next);
   }
+  word.name = {name_.data(), letters};
   const bool negative = next == '-';
   if (negative) next = Get();
   int64_t number = 0;

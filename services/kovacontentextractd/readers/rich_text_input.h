@@ -3,7 +3,7 @@
 #include <array>
 #include <chrono>
 #include <cstddef>
-#include <string>
+#include <string_view>
 
 #include "services/kovacontentextractd/readers/byte_source.h"
 #include "services/kovacontentextractd/readers/cpu_budget.h"
@@ -15,8 +15,8 @@ class RichTextInput {
  public:
   /// A control word: of "\fs24", "fs" and 24.
   struct Word {
-    std::string name;  ///< of a longer one, the first 32 letters
-    int number = 1;    ///< 1 where the file has none
+    std::string_view name;  ///< of a longer one, the first 32 letters; valid until the next one is read
+    int number = 1;         ///< 1 where the file has none
   };
 
   RichTextInput(const Source& source, std::chrono::milliseconds cpu_max) : source_(source), budget_(cpu_max) {}
@@ -28,6 +28,9 @@ class RichTextInput {
   }
   /// Gives back the byte that Get gave last, if it gave one.
   void Unget() { at_ -= size_ > 0 ? 1 : 0; }
+  /// Takes what comes before the next brace, "\", or end of a line, or the part of it that is read; valid until the
+  /// next call. Empty where one of them comes next.
+  std::string_view GetText();
   /// Passes `count` bytes, none when it is not above 0.
   void Skip(int count);
 
@@ -46,6 +49,7 @@ class RichTextInput {
   const CpuBudget budget_;
   std::array<char, 16384> buffer_;
   size_t at_ = 0, size_ = 0;
+  std::array<char, 32> name_;  ///< of the word that was read last
 };
 
 }  // namespace ferrox::extract
