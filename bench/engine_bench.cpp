@@ -230,6 +230,27 @@ class Bench {
     Call("commit");
     printf("rename %-6zu          %.2f s, with the commit %.2f s, %.2f s of CPU\n", count, answered, WallSec(began),
            CpuSec() - cpu);
+    MeasureMove();
+  }
+
+  /// There and back, so that what follows finds the documents where they were.
+  void MeasureMove() {
+    Call("document_upsert_by_id", [](Json::Value& data) {
+      data["doc_id"] = "/volume1/moved";
+      data["data"]["KOVAMDParent"] = "/volume1";
+    });
+    for (const auto& [from, to] :
+         {std::pair("/volume1/moved", "/volume1/again"), {"/volume1/again", "/volume1/moved"}}) {
+      const double cpu = CpuSec();
+      const auto began = SteadyClock::now();
+      Call("folder_move", [from = from, to = to](Json::Value& data) {
+        data["doc_id"] = from;
+        data["data"]["KOVAMDPath"] = to;
+      });
+      Call("commit");
+      printf("move of their folder   %.1f ms with the commit, %.1f ms of CPU\n", WallSec(began) * 1000,
+             (CpuSec() - cpu) * 1000);
+    }
   }
 
   void MeasureDelete() {

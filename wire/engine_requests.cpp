@@ -82,6 +82,14 @@ Json::Value SetDocumentRequest(const std::string& index_id, const Json::Value& d
   return request;
 }
 
+Json::Value MoveFolderRequest(const std::string& index_id, const std::string& path, const std::string& stamp,
+                              Json::Value members) {
+  Json::Value request = DocumentRequest("folder_move", index_id, path);
+  if (!stamp.empty()) request["data"]["stamp"] = stamp;
+  request["data"]["data"] = std::move(members);
+  return request;
+}
+
 Json::Value DeleteDocumentRequest(const std::string& index_id, const std::string& path) {
   return DocumentRequest("document_del_by_id", index_id, path);
 }

@@ -36,6 +36,10 @@ Json::Value UpsertDocumentRequest(const std::string& index_id, const std::string
 /// Changes the members of a stored document that `members` has; null removes one, the others stay. A new KOVAMDPath
 /// moves the document. `doc_id` is its path, as a value: it may come from a reply as it was.
 Json::Value SetDocumentRequest(const std::string& index_id, const Json::Value& doc_id, Json::Value members);
+/// The same for a folder's document, whose new KOVAMDPath `members` has: all documents below it move along. Refused
+/// when its "_KOVAStamp" is not `stamp`; "": it may be any.
+Json::Value MoveFolderRequest(const std::string& index_id, const std::string& path, const std::string& stamp,
+                              Json::Value members);
 Json::Value DeleteDocumentRequest(const std::string& index_id, const std::string& path);
 
 // Documents by a query.

@@ -146,6 +146,11 @@ void IndexRename(const std::string& share, const std::string& new_path, const st
   SendRequest(MoveBelowRequest(index_id, new_path, old_path, below));
 }
 
+void IndexMove(const std::string& share, const std::string& new_path, const std::string& old_path,
+               const std::string& stamp) {
+  SendRequest(wire::MoveFolderRequest(GetFileIndexID(share), old_path, stamp, MovedDocument(new_path)));
+}
+
 void IndexGetByPrefixPath(const std::string& index_id, const std::string& prefix, std::vector<std::string>& paths) {
   for (const Json::Value& entry : ListBelow(index_id, prefix, {kKOVAMDPath})) {
     FERROX_FAIL_IF(!IsJsonObject(entry) || !isJsonType<std::string>(entry.get(kKOVAMDPath, "")),

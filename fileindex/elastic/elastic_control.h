@@ -47,6 +47,10 @@ FERROX_EXPORT void IndexDelDir(const std::string& share, const std::string& dir)
 /// Moves the document at `old_path`, and all below it, to `new_path`.
 /// @throws Error kBadEngineReply when the list of what lies below is unusable.
 FERROX_EXPORT void IndexRename(const std::string& share, const std::string& new_path, const std::string& old_path);
+/// The same in one request, which the engine carries out at once however much lies below. Refused when the document's
+/// "_KOVAStamp" is not `stamp`; "": it may be any. @throws Error kEngineNoSuchDocument then, and as IndexRename.
+FERROX_EXPORT void IndexMove(const std::string& share, const std::string& new_path, const std::string& old_path,
+                             const std::string& stamp);
 /// Appends to `paths` the paths of all documents below `prefix` in the index `index_id`; all come in one reply.
 /// @throws Error kBadEngineReply.
 FERROX_EXPORT void IndexGetByPrefixPath(const std::string& index_id, const std::string& prefix,

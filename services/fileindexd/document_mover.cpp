@@ -15,9 +15,6 @@ using KOVA::CONTENT_EXTRACT::Stamp;
 
 namespace {
 
-/// A folder with fewer documents is moved in one request, whose answer lists them all and is held in memory by both
-/// sides.
-constexpr unsigned kMovedAtOnce = 20000;
 /// How many documents are tried for one whose file is in the share still: others may have been deleted or replaced.
 constexpr unsigned kSampledDocuments = 1000;
 
@@ -62,18 +59,15 @@ bool DocumentMover::DescribesFile(const std::string& path, const struct stat& st
   return !indexed.empty() && SameFile(indexed.front().stamp, Stamp(status));
 }
 
-/// Of a folder with very many documents, each entry on its own; the folder's own document is left to the comparison.
 void DocumentMover::Move(const Step& step) {
   const auto& [path, old_path] = step;
   interruption_.Check();
-  if (!HoldsDocumentsOf(old_path, path)) return;
-  if (IsFolder(path) && index_.List(old_path, "", kMovedAtOnce).size() == kMovedAtOnce) {
-    for (const std::string& entry : EntriesOf(path)) Move({entry, old_path + entry.substr(path.size())});
-    return;
-  }
+  const std::optional<std::string> stamp = StampOfDocument(old_path, path);
+  if (!stamp.has_value()) return;
   writer_.WillChange();
   try {
-    index_.Rename(path, old_path);
+    index_.Move(path, old_path, *stamp);
+    if (IsFolder(path)) moved_folder_ = true;
   } catch (const Error& error) {
     if (error.Code() != Error::kEngineNoSuchDocument) throw;
   }
@@ -86,14 +80,16 @@ std::vector<std::string> DocumentMover::IndexedTopsOf(const std::string& path) {
   return path == root_ && rules_.CanBeIndexed(path) ? EntriesOf(root_) : folders_.Topmost(path);
 }
 
-/// Whether what the index has at the old path is what is at the new one now. When that has gone on to yet another
-/// place, a later rename names that; the documents are its, unless there is something new at the old path.
-bool DocumentMover::HoldsDocumentsOf(const std::string& old_path, const std::string& path) {
+/// The stamp of the document at the old path, if that is of what is at the new one now. When that has gone on to yet
+/// another place, a later rename names that; the documents are its, unless there is something new at the old path.
+std::optional<std::string> DocumentMover::StampOfDocument(const std::string& old_path, const std::string& path) {
   struct stat status = {};
-  const auto indexed = index_.Find(old_path);
-  if (indexed.empty()) return false;
-  if (PresenceOf(path, status) == Presence::kThere) return SameFile(indexed.front().stamp, Stamp(status));
-  return PresenceOf(old_path, status) == Presence::kGone;
+  auto indexed = index_.Find(old_path);
+  if (indexed.empty()) return std::nullopt;
+  const bool is_there = PresenceOf(path, status) == Presence::kThere;
+  const bool same =
+      is_there ? SameFile(indexed.front().stamp, Stamp(status)) : PresenceOf(old_path, status) == Presence::kGone;
+  return same ? std::optional<std::string>(std::move(indexed.front().stamp)) : std::nullopt;
 }
 
 }  // namespace ferrox::indexd

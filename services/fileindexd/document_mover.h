@@ -1,5 +1,7 @@
 #pragma once
 
+#include <atomic>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -39,10 +41,12 @@ class DocumentMover {
   bool DescribesFile(const std::string& path, const struct stat& status);
   /// Carries out a step if the documents describe what is at the new path. From any thread. @throws Interrupted; Error.
   void Move(const Step& step);
+  /// Whether any of the steps so far moved a folder.
+  bool MovedFolder() const { return moved_folder_; }
 
  private:
   std::vector<std::string> IndexedTopsOf(const std::string& path);
-  bool HoldsDocumentsOf(const std::string& old_path, const std::string& path);
+  std::optional<std::string> StampOfDocument(const std::string& old_path, const std::string& path);
 
   const std::string& root_;
   ShareIndex& index_;
@@ -50,6 +54,7 @@ class DocumentMover {
   PathRules& rules_;
   DocumentWriter& writer_;
   const Interruption& interruption_;
+  std::atomic<bool> moved_folder_{false};
 };
 
 }  // namespace ferrox::indexd

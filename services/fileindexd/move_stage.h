@@ -30,6 +30,9 @@ class MoveStage {
   /// Returns when all that was begun is done. @throws Interrupted; Error.
   void Finish();
 
+  /// Whether a folder was moved with all below it.
+  bool MovedFolder() const { return mover_.MovedFolder(); }
+
   /// Moves the documents of folders among `differing`, those whose configuration has changed, that are indexed under
   /// another name now, as a user's renamed home is.
   void MoveRenamedFolders(const std::vector<std::string>& differing);

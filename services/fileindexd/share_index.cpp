@@ -94,8 +94,8 @@ class Engine : public ShareIndex {
     elastic::SendRequest(reply, wire::CompoundRequest(std::move(parts)));
     for (const Json::Value& part : reply["data"]) ThrowIfFailed(part);
   }
-  void Rename(const std::string& new_path, const std::string& old_path) override {
-    elastic::IndexRename(share_, new_path, old_path);
+  void Move(const std::string& new_path, const std::string& old_path, const std::string& stamp) override {
+    elastic::IndexMove(share_, new_path, old_path, stamp);
   }
   void Commit() override { elastic::IndexCommit(share_); }
 

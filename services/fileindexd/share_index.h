@@ -47,8 +47,9 @@ class ShareIndex {
   /// Removes the documents at the paths, and, with `and_below`, all below them; in one request. Missing ones are no
   /// error.
   virtual void Delete(const std::vector<std::string>& paths, bool and_below) = 0;
-  /// Moves the document at the old path and all below it. @throws Error kEngineNoSuchDocument.
-  virtual void Rename(const std::string& new_path, const std::string& old_path) = 0;
+  /// Moves the document at the old path, whose stamp is `stamp`, and all below it; what is below costs nothing.
+  /// @throws Error kEngineNoSuchDocument, also when the stamp is another.
+  virtual void Move(const std::string& new_path, const std::string& old_path, const std::string& stamp) = 0;
   /// Returns when everything before it would survive a power cut.
   virtual void Commit() = 0;
   /// At most `limit` documents below `folder`, in byte order of their paths, those after `after` when it is not "".

@@ -113,6 +113,28 @@ TEST_F(EngineTest, CompoundsGoOnAfterAFailedPart) {
   EXPECT_EQ(marks["data"].size(), 2U) << toString(marks);
 }
 
+TEST_F(EngineTest, AFolderMovesWithAllBelowIt) {
+  ASSERT_EQ(0, Create("a", "a"));
+  EXPECT_EQ(0, Code("document_upsert_by_id",
+                    R"({"id":"a","doc_id":"/v/old","data":{"KOVAMDParent":"/v","_KOVAStamp":"1.1.1.7"}})"));
+  for (const char* path : {"/v/old/x", "/v/old/deep/y", "/v/older"}) ASSERT_EQ(0, Put("a", path, "word"));
+  const auto move = [this](const std::string& from, const std::string& to, const std::string& stamp) {
+    return Code("folder_move", R"({"id":"a","doc_id":")" + from + R"(","stamp":")" + stamp +
+                                   R"(","data":{"KOVAMDPath":")" + to + "\"}}");
+  };
+  EXPECT_EQ(Error::kEngineNoSuchDocument, move("/v/old", "/v/new", "1.1.1.8")) << "another folder by now";
+  EXPECT_EQ(Error::kEngineNoSuchDocument, move("/v/none", "/v/new", ""));
+  for (const char* to : {"/v/old", "/v/old/deep/in", "/v", "new"}) {
+    EXPECT_EQ(Error::kEngineBadRequest, move("/v/old", to, "")) << to;
+  }
+  EXPECT_EQ(0, move("/v/old", "/w/new", "1.1.1.7"));
+  EXPECT_EQ(Error::kEngineNoSuchDocument, move("/v/old", "/w/new", "1.1.1.7")) << "done already, it changes nothing";
+  EXPECT_EQ(0, Commit("a"));
+  EXPECT_EQ(3, Total("path:/w/new"));
+  EXPECT_EQ(1, Total("word path:/w/new/deep"));
+  EXPECT_EQ(1, Total("path:/v"));
+}
+
 TEST_F(EngineTest, IndicesPauseMoveRenameAndGo) {
   ASSERT_EQ(Create("a", "a"), 0);
   EXPECT_EQ(Create("a", "a"), 0) << "the same again";

@@ -72,9 +72,9 @@ class FakeIndex : public indexd::ShareIndex {
     }
   }
 
-  void Rename(const std::string& new_path, const std::string& old_path) override {
+  void Move(const std::string& new_path, const std::string& old_path, const std::string& stamp) override {
     const std::lock_guard lock(mutex);
-    (void)RequireDocument(old_path);
+    if (RequireDocument(old_path).stamp != stamp) throw Error(Error::kEngineNoSuchDocument, "another stamp");
     std::map<std::string, Document> moved;
     std::erase_if(documents, [&](const auto& item) {
       const bool moves = item.first == old_path || StringStartWith(item.first, old_path + "/");

@@ -40,8 +40,6 @@ FORWARDING |= {"common/unique_fd.h", "common/scope_exit.h", "platform/include/ko
 EXCEPTIONS = {
     # A queue is read into a tree, and one that is searched keeps the folders loaded.
     "fileindex/queue/queue_mgr.cpp": ["fileindex/optree/optree.h", "fileindex/folders/folder_mgr.h"],
-    # A store is what answers searches; the search in it is made of parts of the store.
-    "services/kovaelasticd/store/sqlite_store.cpp": ["services/kovaelasticd/search/sqlite_search.h"],
     # The documents that the platform makes of files have the fields of the index; the header is names alone.
     "platform/host/content/facts.cpp": ["wire/fields.h"],
     "platform/host/content/parse_file.cpp": ["wire/fields.h"],

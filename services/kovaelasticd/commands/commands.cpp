@@ -4,6 +4,7 @@
 
 #include <algorithm>
 
+#include "base/path.h"
 #include "common/json_util.h"
 #include "common/log.h"
 
@@ -217,6 +218,7 @@ Json::Value OnPing(CommandCall& /*call*/) {
 
 constexpr const char* kUpsert = "document_upsert_by_id";
 constexpr const char* kSet = "document_set_by_id";
+constexpr const char* kMoveFolder = "folder_move";
 constexpr const char* kDelete = "document_del_by_id";
 constexpr const char* kDeleteQuery = "document_del_by_query";
 
@@ -231,6 +233,7 @@ constexpr Command kCommands[] = {{"index_create", &OnIndexCreate, false},
                                  {"index_stat", &OnIndexStat, false},
                                  {kUpsert, &OnDocumentChange<kUpsert>, false},
                                  {kSet, &OnDocumentChange<kSet>, false},
+                                 {kMoveFolder, &OnDocumentChange<kMoveFolder>, false},
                                  {kDelete, &OnDocumentChange<kDelete>, false},
                                  {kDeleteQuery, &OnDocumentChange<kDeleteQuery>, false},
                                  {"document_get_by_query", &OnGetByQuery, false},
@@ -249,7 +252,8 @@ const Command* FindCommand(const std::string& name) {
 }
 
 bool IsDocumentChange(const std::string& command) {
-  return command == kUpsert || command == kSet || command == kDelete || command == kDeleteQuery;
+  return command == kUpsert || command == kSet || command == kMoveFolder || command == kDelete ||
+         command == kDeleteQuery;
 }
 
 DocumentChange ReadDocumentChange(const std::string& command, const Registry::OpenIndex& index, Json::Value& data) {
@@ -265,6 +269,12 @@ DocumentChange ReadDocumentChange(const std::string& command, const Registry::Op
   Json::Value& document = data["data"];
   index.schema->Check(document);
   const Json::Value& stored_path = document[field::kPath];
+  if (command == kMoveFolder) {
+    const std::string new_path = CheckedPath(field::kPath, RequiredText(document, field::kPath));
+    if (base::IsAtOrBelow(new_path, path) || base::IsAtOrBelow(path, new_path))
+      RefuseMember(field::kPath, "a path that is neither the folder's nor above nor below it");
+    return {DocumentChange::Type::kMoveFolder, path, &document, OptionalText(data, "stamp").value_or("")};
+  }
   if (command == kSet) {
     // A new path moves the document; null is no path.
     if (stored_path.isString()) {
@@ -289,6 +299,8 @@ void Apply(IndexStore& store, const DocumentChange& change) {
       return store.Upsert(change.path, *change.data);
     case DocumentChange::Type::kSet:
       return store.Set(change.path, *change.data);
+    case DocumentChange::Type::kMoveFolder:
+      return store.MoveFolder(change.path, change.stamp, *change.data);
     case DocumentChange::Type::kDelete:
       return store.Delete(change.path);
     case DocumentChange::Type::kDeletePrefix:

@@ -32,10 +32,11 @@ const Command* FindCommand(const std::string& name);
 
 /// One change of a document, checked.
 struct DocumentChange {
-  enum class Type { kUpsert, kSet, kDelete, kDeletePrefix };
+  enum class Type { kUpsert, kSet, kMoveFolder, kDelete, kDeletePrefix };
   Type type;
   std::string path;
   const Json::Value* data = nullptr;  ///< into the request
+  std::string stamp = {};             ///< of kMoveFolder
 };
 
 /// Whether the command changes a document; such commands of one compound are carried out together.

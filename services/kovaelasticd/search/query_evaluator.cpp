@@ -7,6 +7,7 @@
 #include "base/path.h"
 #include "fileindex/util.h"
 #include "services/kovaelasticd/store/document.h"
+#include "services/kovaelasticd/store/store_rows.h"
 #include "services/kovaelasticd/text/words.h"
 
 namespace ferrox::engine {
@@ -131,12 +132,7 @@ DocSet QueryEvaluator::EvaluateFilter(const QueryNode& node) {
     statement.Bind(1, int64_t{KindOfExtension(node.text)}).Bind(2, int64_t{kFolder});
     collect(statement.Bind(3, std::string_view(node.text)));
   } else if (node.type == QueryNode::Type::kPath) {
-    const std::string begin = node.text + "/";
-    const std::string end = node.text + "0";  // the character behind "/"
-    Statement statement = database.Prepare("SELECT id FROM docs WHERE path >= ?1 AND path < ?2");
-    collect(statement.Bind(1, std::string_view(begin)).Bind(2, std::string_view(end)));
-    Statement itself = database.Prepare("SELECT id FROM docs WHERE path = ?1");
-    collect(itself.Bind(1, std::string_view(node.text)));
+    found = DocumentsAt(node.text);
   } else if (node.type == QueryNode::Type::kRange) {
     Statement statement = database.Prepare("SELECT doc FROM temp.meta_terms WHERE term >= ?1 AND term <= ?2");
     for (const std::string& name : node.fields) {
@@ -149,6 +145,42 @@ DocSet QueryEvaluator::EvaluateFilter(const QueryNode& node) {
         database.Prepare(node.type == QueryNode::Type::kSize ? "SELECT id FROM docs WHERE size BETWEEN ?1 AND ?2"
                                                              : "SELECT id FROM docs WHERE mtime BETWEEN ?1 AND ?2");
     collect(statement.Bind(1, node.low).Bind(2, node.high));
+  }
+  return found;
+}
+
+/// The document at `path`, and all in its folder and those below. Of a small part of the tree each folder's documents
+/// are listed; beyond that one walk over the list of all documents by folder is cheaper.
+DocSet QueryEvaluator::DocumentsAt(const std::string& path) {
+  constexpr size_t kFoldersListed = 1000;
+  DocSet found;
+  const std::optional<StoredDocument> itself = FindDocument(database_, tree_, path);
+  if (itself.has_value()) found.Add(itself->id);
+  std::vector<int64_t> folders;
+  DocSet is_below;  // of folders' numbers
+  const auto add = [&](int64_t folder) {
+    folders.push_back(folder);
+    is_below.Add(folder);
+  };
+  const int64_t top = tree_.Find(path == "/" ? path : path + "/");
+  if (top == FolderTree::kNone) return found;
+  add(top);
+  Statement below = database_.Prepare("SELECT id FROM folders WHERE parent = ?1");
+  for (size_t i = 0; i < folders.size(); ++i) {
+    for (below.Bind(1, folders[i]); below.Step();) add(below.Int(0));
+    below.Reset();
+  }
+  if (folders.size() > kFoldersListed) {
+    Statement all = database_.Prepare("SELECT folder, id FROM docs INDEXED BY docs_place");
+    while (all.Step()) {
+      if (is_below.Contains(all.Int(0))) found.Add(all.Int(1));
+    }
+    return found;
+  }
+  Statement documents = database_.Prepare("SELECT id FROM docs WHERE folder = ?1");
+  for (const int64_t folder : folders) {
+    for (documents.Bind(1, folder); documents.Step();) found.Add(documents.Int(0));
+    documents.Reset();
   }
   return found;
 }
@@ -171,7 +203,7 @@ void QueryEvaluator::ApplyFilter(DocSet& documents, const QueryNode& filter, boo
 
 /// The same condition for one document, by its row.
 bool QueryEvaluator::MatchesFilter(int64_t id, const QueryNode& filter) {
-  Statement statement = database_.Prepare("SELECT kind, ext, size, mtime, path FROM docs WHERE id = ?1");
+  Statement statement = database_.Prepare("SELECT kind, ext, size, mtime, folder, leaf FROM docs WHERE id = ?1");
   statement.Bind(1, id);
   if (!statement.Step()) return false;
   const auto in_range = [&](int column) {
@@ -188,7 +220,7 @@ bool QueryEvaluator::MatchesFilter(int64_t id, const QueryNode& filter) {
     case QueryNode::Type::kDate:
       return in_range(3);
     default:
-      return base::IsAtOrBelow(statement.Text(4), filter.text);
+      return base::IsAtOrBelow(tree_.PathOf(statement.Int(4)) + std::string(statement.Text(5)), filter.text);
   }
 }
 

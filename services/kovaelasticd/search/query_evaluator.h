@@ -6,6 +6,7 @@
 
 #include "services/kovaelasticd/query/query.h"
 #include "services/kovaelasticd/store/doc_set.h"
+#include "services/kovaelasticd/store/folder_tree.h"
 #include "services/kovaelasticd/store/fts.h"
 #include "services/kovaelasticd/store/sqlite_db.h"
 #include "services/kovaelasticd/text/snippet.h"
@@ -32,8 +33,8 @@ class QueryEvaluator {
  public:
   /// `documents`: how many the index has. `hits_max`: of how many documents, those added last, each word's hits are
   /// kept for ranking; the sets are complete in any case.
-  QueryEvaluator(Database& database, int64_t documents, size_t hits_max)
-      : database_(database), documents_(documents), hits_max_(hits_max) {}
+  QueryEvaluator(Database& database, FolderTree& tree, int64_t documents, size_t hits_max)
+      : database_(database), tree_(tree), documents_(documents), hits_max_(hits_max) {}
 
   /// @throws Error kEngineStorage.
   DocSet Evaluate(const QueryNode& query) { return Evaluate(query, true); }
@@ -47,11 +48,13 @@ class QueryEvaluator {
   DocSet EvaluateWords(const QueryNode& node, bool ranking);
   DocSet EvaluateFilter(const QueryNode& node);
   DocSet AllDocuments();
+  DocSet DocumentsAt(const std::string& path);
   void ApplyFilter(DocSet& documents, const QueryNode& filter, bool wanted);
   bool MatchesFilter(int64_t id, const QueryNode& filter);
   void CollectWords(const QueryNode& node, HitCollector& content, HitCollector& meta);
 
   Database& database_;
+  FolderTree& tree_;
   const int64_t documents_;
   const size_t hits_max_;
   FoundWords found_words_;

@@ -3,8 +3,10 @@
 #include <algorithm>
 #include <iterator>
 #include <limits>
+#include <memory>
 #include <utility>
 
+#include "services/kovaelasticd/store/sqlite_store.h"
 #include "services/kovaelasticd/store/suggest.h"
 #include "services/kovaelasticd/text/snippet.h"
 
@@ -92,7 +94,7 @@ SearchHit Searcher::LoadHit(const RankedDocument& ranked, const FoundWords& word
   hit.score = ranked.score;
   hit.number_key = ranked.number_key;
   hit.name_key = ranked.name_key;
-  const std::optional<StoredDocument> stored = FindDocument(reader_.database, ranked.id);
+  const std::optional<StoredDocument> stored = FindDocument(reader_.database, reader_.tree, ranked.id);
   if (!stored.has_value()) return hit;
   hit.path = stored->row.path;
   hit.fields = UnpackDocument(stored->row, reader_.names, {});
@@ -106,7 +108,7 @@ SearchHit Searcher::LoadHit(const RankedDocument& ranked, const FoundWords& word
 
 SearchReply Searcher::Run() {
   const Totals totals = LoadTotals(reader_.database);
-  QueryEvaluator evaluator(reader_.database, totals.documents, request_.ranked_max);
+  QueryEvaluator evaluator(reader_.database, reader_.tree, totals.documents, request_.ranked_max);
   const DocSet documents = evaluator.Evaluate(*request_.query);
   SearchReply reply;
   reply.total = documents.Count();
@@ -115,6 +117,16 @@ SearchReply Searcher::Run() {
                                                : OrderByColumn(documents, reply.total);
   for (const RankedDocument& ranked : page) reply.hits.push_back(LoadHit(ranked, evaluator.Words()));
   if (reply.total == 0) reply.suggestions = Suggest(reader_.database, evaluator.Words().looked_for);
+  return reply;
+}
+
+SearchReply SqliteStore::Search(const SearchRequest& request) {
+  std::unique_ptr<StoreReader> reader = readers_.Borrow();
+  reader->database.Execute("BEGIN");
+  reader->Refresh();
+  SearchReply reply = Searcher(*reader, request).Run();
+  reader->database.Execute("COMMIT");
+  readers_.Return(std::move(reader));
   return reply;
 }
 

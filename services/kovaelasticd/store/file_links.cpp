@@ -58,7 +58,7 @@ void FileLinks::MarkOthers(int64_t file, int64_t id, const std::string& stamp) {
     while (statement.Step()) others.push_back(statement.Int(0));
   }
   for (const int64_t other : others) {
-    const std::optional<StoredDocument> stored = FindDocument(database_, other);
+    const std::optional<StoredDocument> stored = FindDocument(database_, tree_, other);
     if (!stored.has_value() || StampOf(&stored->row) == stamp) continue;
     database_.Prepare("INSERT INTO suspects VALUES(?1)").Bind(1, other).Run();
   }

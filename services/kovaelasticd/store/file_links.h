@@ -5,6 +5,7 @@
 #include <string>
 
 #include "services/kovaelasticd/store/document.h"
+#include "services/kovaelasticd/store/folder_tree.h"
 #include "services/kovaelasticd/store/sqlite_db.h"
 #include "wire/fields.h"
 
@@ -18,8 +19,9 @@ class FileLinks {
   /// The member of a document that tells what was seen of its file.
   static constexpr auto& kStamp = fileindex::elastic::k_KOVAStamp;
 
-  /// Both must outlive this; `names` are those that the rows are packed with.
-  FileLinks(Database& database, const FieldNames& names) : database_(database), names_(names) {}
+  /// All must outlive this; `names` are those that the rows are packed with.
+  FileLinks(Database& database, FolderTree& tree, const FieldNames& names)
+      : database_(database), tree_(tree), names_(names) {}
 
   /// Makes the tables where they are missing.
   void MakeTables();
@@ -33,6 +35,7 @@ class FileLinks {
   void MarkOthers(int64_t file, int64_t id, const std::string& stamp);
 
   Database& database_;
+  FolderTree& tree_;
   const FieldNames& names_;
 };
 

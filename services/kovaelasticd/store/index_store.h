@@ -86,6 +86,13 @@ class IndexStore {
   /// Changes members of the document at `path`; null removes one. A new KOVAMDPath moves the document and replaces
   /// what is there. @throws Error kEngineNoSuchDocument, nothing is changed then.
   virtual void Set(const std::string& path, const Json::Value& changes) = 0;
+  /// Set for the document at `path`, whose new KOVAMDPath must be given, and all documents below it move along. What
+  /// follows from a path (parent, names) follows; nothing else of theirs changes, and it costs the same whatever is
+  /// below, unless there are documents below the new path already: those that meet one that moves are replaced then.
+  /// `stamp`, unless "", is what the document's "_KOVAStamp" must be.
+  /// Neither path may lie at or below the other.
+  /// @throws Error kEngineNoSuchDocument where none is at `path`, or another; nothing is changed then.
+  virtual void MoveFolder(const std::string& path, const std::string& stamp, const Json::Value& changes) = 0;
   virtual void Delete(const std::string& path) = 0;
   virtual void DeletePrefix(const std::string& prefix) = 0;
   /// Lists documents, uncommitted ones too.

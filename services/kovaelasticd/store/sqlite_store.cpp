@@ -3,10 +3,13 @@
 #include <sys/stat.h>
 
 #include <algorithm>
+#include <iterator>
+#include <limits>
+#include <map>
 
 #include "common/file_util.h"
-#include "services/kovaelasticd/search/sqlite_search.h"
 #include "services/kovaelasticd/store/index_files.h"
+#include "services/kovaelasticd/store/path_walk.h"
 #include "services/kovaelasticd/store/store_format.h"
 #include "services/kovaelasticd/store/suggest.h"
 
@@ -18,8 +21,8 @@ namespace {
 constexpr int64_t kLogMaxBytes = 16 << 20;
 /// What a change counts for besides its text, in bytes, until the next automatic commit.
 constexpr int64_t kRowBytes = 512;
-/// How many documents DeletePrefix holds in memory at a time.
-constexpr int kDeleteStep = 1000;
+/// How many documents are held in memory at a time, to be removed or moved.
+constexpr size_t kStep = 1000;
 
 int64_t BytesOnDisk(const std::string& path) {
   struct stat status = {};
@@ -50,7 +53,7 @@ IndexStore::~IndexStore() = default;
 
 SqliteStore::SqliteStore(const std::string& path, bool create, std::shared_ptr<const Schema> schema)
     : schema_(std::move(schema)), writer_(path, OpeningMode(path, create)), readers_(path) {
-  PrepareStore(writer_, create);
+  PrepareStore(writer_, create, *schema_);
   links_.MakeTables();
   LoadFieldNames(writer_, names_);
   totals_ = LoadTotals(writer_);
@@ -91,6 +94,7 @@ void SqliteStore::Rollback() {
   in_transaction_ = false;
   // A failure may have ended the transaction already.
   if (sqlite3_get_autocommit(writer_.Handle()) == 0) writer_.Execute("ROLLBACK");
+  tree_.Forget();
   names_ = FieldNames();
   LoadFieldNames(writer_, names_);
   totals_ = LoadTotals(writer_);
@@ -112,22 +116,24 @@ void SqliteStore::Changed(int64_t bytes) {
 }
 
 int64_t SqliteStore::InsertRow(const DocRow& row, int64_t text_bytes) {
-  Statement statement = writer_.Prepare("INSERT INTO docs VALUES(?1, ?2, ?3, ?4, ?5, ?6, ?7, ?8, ?9, ?10, ?11)");
+  Statement statement = writer_.Prepare("INSERT INTO docs VALUES(?1, ?2, ?3, ?4, ?5, ?6, ?7, ?8, ?9, ?10, ?11, ?12)");
   statement.BindNull(1);
-  BindRow(statement, row, text_bytes);
+  BindRow(statement, tree_.Make(FolderTree::FolderOf(row.path)), row, text_bytes);
   statement.Run();
   ++totals_.documents;
   CountText(0, text_bytes);
   return sqlite3_last_insert_rowid(writer_.Handle());
 }
 
-void SqliteStore::UpdateRow(int64_t id, const DocRow& row, int64_t text_bytes) {
+void SqliteStore::UpdateRow(const StoredDocument& before, const DocRow& row, int64_t text_bytes) {
+  const int64_t folder = tree_.Make(FolderTree::FolderOf(row.path));
   Statement statement = writer_.Prepare(
-      "UPDATE docs SET path = ?2, name = ?3, ext = ?4, kind = ?5, size = ?6, mtime = ?7, text_bytes = ?8,"
-      " derived = ?9, error = ?10, packed = ?11 WHERE id = ?1");
-  statement.Bind(1, id);
-  BindRow(statement, row, text_bytes);
+      "UPDATE docs SET folder = ?2, leaf = ?3, name = ?4, ext = ?5, kind = ?6, size = ?7, mtime = ?8, text_bytes = ?9,"
+      " derived = ?10, error = ?11, packed = ?12 WHERE id = ?1");
+  statement.Bind(1, before.id);
+  BindRow(statement, folder, row, text_bytes);
   statement.Run();
+  if (folder != before.folder) tree_.Prune(before.folder);
 }
 
 void SqliteStore::Upsert(const std::string& path, const Json::Value& document) {
@@ -136,11 +142,11 @@ void SqliteStore::Upsert(const std::string& path, const Json::Value& document) {
   const std::string_view text = WithoutMarks(TextOf(document));
   const DocRow row = PackDocument(path, document, names_);
   const auto text_bytes = static_cast<int64_t>(text.size());
-  const std::optional<StoredDocument> before = FindDocument(writer_, path);
+  const std::optional<StoredDocument> before = FindDocument(writer_, tree_, path);
   MetaText meta = MakeMetaText(row, document, *schema_);
   if (before.has_value()) {
     texts_.Replace(*before, std::move(meta), text);
-    UpdateRow(before->id, row, text_bytes);
+    UpdateRow(*before, row, text_bytes);
     CountText(before->text_bytes, text_bytes);
     links_.OnChange(before->id, &before->row, &row);
   } else {
@@ -152,7 +158,7 @@ void SqliteStore::Upsert(const std::string& path, const Json::Value& document) {
 }
 
 void SqliteStore::Set(const std::string& path, const Json::Value& changes) {
-  const std::optional<StoredDocument> before = FindDocument(writer_, path);
+  const std::optional<StoredDocument> before = FindDocument(writer_, tree_, path);
   if (!before.has_value()) throw Error(Error::kEngineNoSuchDocument, "there is no document \"" + path + "\" to change");
   Begin();
   AddFieldNames(writer_, names_, changes);
@@ -171,22 +177,55 @@ void SqliteStore::Set(const std::string& path, const Json::Value& changes) {
   const std::string_view text = WithoutMarks(TextOf(changes));
   const int64_t text_bytes = text_changed ? static_cast<int64_t>(text.size()) : before->text_bytes;
   texts_.Replace(*before, MakeMetaText(row, document, *schema_), text_changed ? std::optional(text) : std::nullopt);
-  UpdateRow(before->id, row, text_bytes);
+  UpdateRow(*before, row, text_bytes);
   CountText(before->text_bytes, text_bytes);
   // A document that only moves says nothing new about its file.
   if (changes.isMember(FileLinks::kStamp)) links_.OnChange(before->id, &before->row, &row);
   Changed(text_changed ? text_bytes : 0);
 }
 
+void SqliteStore::MoveFolder(const std::string& path, const std::string& stamp, const Json::Value& changes) {
+  if (!stamp.empty()) {
+    const std::optional<StoredDocument> there = FindDocument(writer_, tree_, path);
+    const bool same =
+        there.has_value() && UnpackDocument(there->row, names_, {FileLinks::kStamp})[FileLinks::kStamp] == stamp;
+    if (!same)
+      throw Error(Error::kEngineNoSuchDocument, "there is no document \"" + path + "\" with that stamp to move");
+  }
+  Set(path, changes);
+  const std::string from = path + "/", to = changes[field::kPath].asString() + "/";
+  const int64_t folder = tree_.Find(from);
+  if (folder == FolderTree::kNone) return;
+  tree_.Find(to) == FolderTree::kNone ? tree_.Move(folder, to) : MoveOneByOne(from, to);
+}
+
+/// Where both folders have documents below them, one may take another's place.
+void SqliteStore::MoveOneByOne(const std::string& from, const std::string& to) {
+  std::vector<std::string> paths;
+  do {
+    paths.clear();
+    PathWalk walk(writer_, tree_, from, "");
+    while (paths.size() < kStep && walk.Next()) paths.push_back(walk.Document().row.path);
+    Json::Value change;
+    for (const std::string& path : paths) {
+      const std::string new_path = to + path.substr(from.size());
+      change[field::kPath] = new_path;
+      change[field::kParent] = Dirname(new_path);
+      Set(path, change);
+    }
+  } while (!paths.empty());
+}
+
 /// Removes the document at `path`, if there is one.
 void SqliteStore::RemoveAt(const std::string& path) {
-  const std::optional<StoredDocument> there = FindDocument(writer_, path);
+  const std::optional<StoredDocument> there = FindDocument(writer_, tree_, path);
   if (there.has_value()) Remove(*there);
 }
 
 void SqliteStore::Remove(const StoredDocument& stored) {
   texts_.Remove(stored);
   writer_.Prepare("DELETE FROM docs WHERE id = ?1").Bind(1, stored.id).Run();
+  tree_.Prune(stored.folder);
   links_.OnChange(stored.id, &stored.row, nullptr);
   --totals_.documents;
   CountText(stored.text_bytes, 0);
@@ -200,17 +239,11 @@ void SqliteStore::Delete(const std::string& path) {
 
 void SqliteStore::DeletePrefix(const std::string& prefix) {
   Begin();
-  static const std::string sql = std::string(kSelectRow) + "WHERE path >= ?1 AND path < ?2 LIMIT ?3";
-  const PrefixRange range(prefix);
   std::vector<StoredDocument> found;
   do {
     found.clear();
-    {
-      Statement statement = writer_.Prepare(sql);
-      range.Bind(statement);
-      statement.Bind(3, int64_t{kDeleteStep});
-      while (statement.Step()) found.push_back(ReadRow(statement));
-    }
+    PathWalk walk(writer_, tree_, prefix, "");
+    while (found.size() < kStep && walk.Next()) found.push_back(walk.Document());
     for (const StoredDocument& stored : found) Remove(stored);
   } while (!found.empty());
 }
@@ -223,29 +256,36 @@ Json::Value SqliteStore::LoadEntry(const StoredDocument& stored, const std::vect
 }
 
 void SqliteStore::Get(const GetRequest& request, const std::function<void(const Json::Value&)>& take) {
-  static const std::string sql =
-      std::string(kSelectRow) + "WHERE path >= max(?1, ?3) AND path < ?2 AND path <> ?3 ORDER BY path LIMIT ?4";
   if (!request.term.empty()) {
-    const std::optional<StoredDocument> stored = FindDocument(writer_, request.term);
+    const std::optional<StoredDocument> stored = FindDocument(writer_, tree_, request.term);
     if (stored.has_value()) take(LoadEntry(*stored, request.fields));
     return;
   }
-  if (request.suspects || request.unread || request.file != 0) {
-    const char* condition = request.suspects ? "id IN (SELECT id FROM suspects)"
-                            : request.unread ? "error IS NOT NULL"
-                                             : "id IN (SELECT id FROM files WHERE file = ?3)";
-    Statement statement =
-        writer_.Prepare(std::string(kSelectRow) + "WHERE " + condition + " AND path > ?1 ORDER BY path LIMIT ?2");
-    statement.Bind(1, std::string_view(request.after)).Bind(2, request.limit);
-    if (!request.suspects && !request.unread) statement.Bind(3, static_cast<int64_t>(request.file));
-    while (statement.Step()) take(LoadEntry(ReadRow(statement), request.fields));
-    return;
+  if (request.suspects || request.unread || request.file != 0) return GetListed(request, take);
+  PathWalk walk(writer_, tree_, request.prefix, request.after);
+  for (int64_t left = request.limit; left != 0 && walk.Next(); --left) take(LoadEntry(walk.Document(), request.fields));
+}
+
+/// Paths are composed, so the list has no order on the disk: those of the page are gathered, and their documents loaded
+/// then.
+void SqliteStore::GetListed(const GetRequest& request, const std::function<void(const Json::Value&)>& take) {
+  Statement statement = writer_.Prepare(
+      request.suspects ? "SELECT docs.id, folder, leaf FROM suspects JOIN docs ON docs.id = suspects.id"
+      : request.unread ? "SELECT id, folder, leaf FROM docs WHERE error IS NOT NULL"
+                       : "SELECT docs.id, folder, leaf FROM files JOIN docs ON docs.id = files.id WHERE file = ?1");
+  if (!request.suspects && !request.unread) statement.Bind(1, static_cast<int64_t>(request.file));
+  std::map<std::string, int64_t> page;
+  const auto page_max = request.limit < 0 ? std::numeric_limits<size_t>::max() : static_cast<size_t>(request.limit);
+  while (statement.Step()) {
+    std::string path = tree_.PathOf(statement.Int(1)) + std::string(statement.Text(2));
+    if (path <= request.after) continue;
+    page.emplace(std::move(path), statement.Int(0));
+    if (page.size() > page_max) page.erase(std::prev(page.end()));
   }
-  Statement statement = writer_.Prepare(sql);
-  const PrefixRange range(request.prefix);  // the statement refers to its texts
-  range.Bind(statement);
-  statement.Bind(3, std::string_view(request.after)).Bind(4, request.limit);
-  while (statement.Step()) take(LoadEntry(ReadRow(statement), request.fields));
+  for (const auto& [path, id] : page) {
+    const std::optional<StoredDocument> stored = FindDocument(writer_, tree_, id);
+    if (stored.has_value()) take(LoadEntry(*stored, request.fields));
+  }
 }
 
 void SqliteStore::RebuildSuggestions() {
@@ -258,36 +298,30 @@ void SqliteStore::RebuildSuggestions() {
 StoreStat SqliteStore::Stat() {
   StoreStat stat;
   std::unique_ptr<StoreReader> reader = readers_.Borrow();
+  reader->database.Execute("BEGIN");
+  reader->Refresh();
   {
     const Totals totals = LoadTotals(reader->database);
     stat.documents = totals.documents;
     stat.with_content = totals.with_content;
     stat.text_bytes = totals.text_bytes;
     Statement errors = reader->database.Prepare(
-        "SELECT error, count(*), min(path), max(path) FROM docs WHERE error IS NOT NULL GROUP BY error");
+        "SELECT error, count(*), min(id), max(id) FROM docs WHERE error IS NOT NULL GROUP BY error");
     while (errors.Step()) {
       const std::string reason(errors.Text(0));
       stat.extract_errors[reason] = errors.Int(1);
       for (int column = 2; column <= (errors.Int(1) == 1 ? 2 : 3); ++column) {
-        stat.extract_error_examples[reason].emplace_back(errors.Text(column));
+        const auto example = FindDocument(reader->database, reader->tree, errors.Int(column));
+        if (example.has_value()) stat.extract_error_examples[reason].push_back(example->row.path);
       }
     }
   }
+  reader->database.Execute("COMMIT");
   readers_.Return(std::move(reader));
   for (const char* suffix : {"", "-wal", "-shm"}) {
     stat.bytes_on_disk += BytesOnDisk(writer_.Path() + suffix);
   }
   return stat;
-}
-
-SearchReply SqliteStore::Search(const SearchRequest& request) {
-  std::unique_ptr<StoreReader> reader = readers_.Borrow();
-  reader->database.Execute("BEGIN");
-  LoadFieldNames(reader->database, reader->names);
-  SearchReply reply = Searcher(*reader, request).Run();
-  reader->database.Execute("COMMIT");
-  readers_.Return(std::move(reader));
-  return reply;
 }
 
 }  // namespace ferrox::engine

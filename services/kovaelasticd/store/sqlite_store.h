@@ -6,6 +6,7 @@
 
 #include "services/kovaelasticd/store/document.h"
 #include "services/kovaelasticd/store/file_links.h"
+#include "services/kovaelasticd/store/folder_tree.h"
 #include "services/kovaelasticd/store/index_store.h"
 #include "services/kovaelasticd/store/sqlite_db.h"
 #include "services/kovaelasticd/store/store_reader.h"
@@ -27,6 +28,7 @@ class SqliteStore : public IndexStore {
 
   void Upsert(const std::string& path, const Json::Value& document) override;
   void Set(const std::string& path, const Json::Value& changes) override;
+  void MoveFolder(const std::string& path, const std::string& stamp, const Json::Value& changes) override;
   void Delete(const std::string& path) override;
   void DeletePrefix(const std::string& prefix) override;
   void Get(const GetRequest& request, const std::function<void(const Json::Value&)>& take) override;
@@ -34,7 +36,7 @@ class SqliteStore : public IndexStore {
   void Rollback() override;
   int64_t UncommittedBytes() const override { return uncommitted_bytes_; }
   void RebuildSuggestions() override;
-  SearchReply Search(const SearchRequest& request) override;
+  SearchReply Search(const SearchRequest& request) override;  ///< defined in search/, whose parts it is made of
   StoreStat Stat() override;
 
   /// The largest size of the file, in pages; for tests of a full disk. 0: no limit.
@@ -47,12 +49,15 @@ class SqliteStore : public IndexStore {
 
   // What changes a document's row; its words go to texts_.
   int64_t InsertRow(const DocRow& row, int64_t text_bytes);
-  void UpdateRow(int64_t id, const DocRow& row, int64_t text_bytes);
+  void MoveOneByOne(const std::string& from, const std::string& to);
+  void UpdateRow(const StoredDocument& before, const DocRow& row, int64_t text_bytes);
   void Remove(const StoredDocument& stored);
   void RemoveAt(const std::string& path);
   /// Keeps the sums, for a text that had `before` bytes and has `after` now.
   void CountText(int64_t before, int64_t after);
   void Changed(int64_t bytes);
+  /// Get of documents that a list of numbers names, not a part of the tree.
+  void GetListed(const GetRequest& request, const std::function<void(const Json::Value&)>& take);
   /// A document as Get returns it, with the changes that are not committed.
   Json::Value LoadEntry(const StoredDocument& stored, const std::vector<std::string>& fields);
 
@@ -60,7 +65,8 @@ class SqliteStore : public IndexStore {
   // Of the thread that writes.
   Database writer_;
   FieldNames names_;
-  FileLinks links_{writer_, names_};
+  FolderTree tree_{writer_};
+  FileLinks links_{writer_, tree_, names_};
   TextWriter texts_{writer_, names_, schema_};
   Totals totals_;                  ///< with the changes of the open transaction
   int64_t uncommitted_bytes_ = 0;  ///< for the automatic commit: texts, and a fixed amount for each change

@@ -1,6 +1,7 @@
 #include "services/kovaelasticd/store/store_reader.h"
 
 #include "services/kovaelasticd/store/fts.h"
+#include "services/kovaelasticd/store/store_rows.h"
 
 namespace ferrox::engine {
 
@@ -16,6 +17,15 @@ StoreReader::StoreReader(const std::string& path) : database(path, Database::Mod
   RegisterFullText(database);
   database.Execute("CREATE VIRTUAL TABLE temp.meta_terms USING fts5vocab('main', 'meta_fts', 'instance')");
   database.Execute("PRAGMA query_only = 1");
+}
+
+void StoreReader::Refresh() {
+  // Differs from the last one when another connection has committed since.
+  const int64_t version = database.QueryInt("PRAGMA data_version");
+  if (version == seen_version_) return;
+  seen_version_ = version;
+  tree.Forget();
+  LoadFieldNames(database, names);
 }
 
 std::unique_ptr<StoreReader> ReaderPool::Borrow() {

@@ -6,6 +6,7 @@
 
 #include "base/mutex.h"
 #include "services/kovaelasticd/store/document.h"
+#include "services/kovaelasticd/store/folder_tree.h"
 #include "services/kovaelasticd/store/sqlite_db.h"
 #include "services/kovaelasticd/store/text_codec.h"
 
@@ -14,9 +15,16 @@ namespace ferrox::engine {
 /// A connection that only reads, with what is needed to understand its rows. For one thread at a time.
 struct StoreReader {
   explicit StoreReader(const std::string& path);
+  /// To be called at the beginning of each transaction: learns what was committed since the last one.
+  void Refresh();
+
   Database database;
-  FieldNames names;  ///< as far as its last user has loaded them
+  FieldNames names;
+  FolderTree tree{database};
   TextCodec codec;
+
+ private:
+  int64_t seen_version_ = -1;  ///< of the database, at the last Refresh
 };
 
 /// The reading connections of one index. A new one has to read the schema and to prepare each statement again, so a few

@@ -16,44 +16,53 @@ constexpr int64_t kFieldNamesMax = 4096;
 
 }  // namespace
 
-StoredDocument ReadRow(const Statement& statement) {
+StoredDocument ReadRow(const Statement& statement, std::string_view folder_path) {
   StoredDocument stored;
   stored.id = statement.Int(0);
-  stored.row.path = statement.Text(1);
-  stored.row.name = statement.Text(2);
-  stored.row.ext = statement.Text(3);
-  stored.row.kind = static_cast<int32_t>(statement.Int(4));
-  if (!statement.IsNull(5)) stored.row.size = statement.Int(5);
-  if (!statement.IsNull(6)) stored.row.mtime = statement.Int(6);
-  stored.text_bytes = statement.Int(7);
-  stored.row.derived = static_cast<uint32_t>(statement.Int(8));
-  stored.row.error = statement.Text(9);
-  stored.row.packed = statement.Text(10);
+  stored.folder = statement.Int(1);
+  stored.row.path = folder_path;
+  stored.row.path += statement.Text(2);
+  stored.row.name = statement.Text(3);
+  stored.row.ext = statement.Text(4);
+  stored.row.kind = static_cast<int32_t>(statement.Int(5));
+  if (!statement.IsNull(6)) stored.row.size = statement.Int(6);
+  if (!statement.IsNull(7)) stored.row.mtime = statement.Int(7);
+  stored.text_bytes = statement.Int(8);
+  stored.row.derived = static_cast<uint32_t>(statement.Int(9));
+  stored.row.error = statement.Text(10);
+  stored.row.packed = statement.Text(11);
   return stored;
 }
 
-void BindRow(Statement& statement, const DocRow& row, int64_t text_bytes) {
-  statement.Bind(2, std::string_view(row.path)).Bind(3, std::string_view(row.name)).Bind(4, std::string_view(row.ext));
-  statement.Bind(5, int64_t{row.kind});
-  row.size.has_value() ? statement.Bind(6, *row.size) : statement.BindNull(6);
-  row.mtime.has_value() ? statement.Bind(7, *row.mtime) : statement.BindNull(7);
-  statement.Bind(8, text_bytes).Bind(9, int64_t{row.derived});
-  row.error.empty() ? statement.BindNull(10) : statement.Bind(10, std::string_view(row.error));
-  statement.BindBlob(11, row.packed);
+StoredDocument ReadRow(const Statement& statement, FolderTree& tree) {
+  return ReadRow(statement, tree.PathOf(statement.Int(1)));
 }
 
-std::optional<StoredDocument> FindDocument(Database& database, const std::string& path) {
-  static const std::string sql = std::string(kSelectRow) + "WHERE path = ?1";
+void BindRow(Statement& statement, int64_t folder, const DocRow& row, int64_t text_bytes) {
+  statement.Bind(2, folder).Bind(3, FolderTree::LeafOf(row.path));
+  statement.Bind(4, std::string_view(row.name)).Bind(5, std::string_view(row.ext)).Bind(6, int64_t{row.kind});
+  row.size.has_value() ? statement.Bind(7, *row.size) : statement.BindNull(7);
+  row.mtime.has_value() ? statement.Bind(8, *row.mtime) : statement.BindNull(8);
+  statement.Bind(9, text_bytes).Bind(10, int64_t{row.derived});
+  row.error.empty() ? statement.BindNull(11) : statement.Bind(11, std::string_view(row.error));
+  statement.BindBlob(12, row.packed);
+}
+
+std::optional<StoredDocument> FindDocument(Database& database, FolderTree& tree, const std::string& path) {
+  static const std::string sql = std::string(kSelectRow) + "WHERE folder = ?1 AND leaf = ?2";
+  const std::string_view folder_path = FolderTree::FolderOf(path);
+  const int64_t folder = tree.Find(folder_path);
+  if (folder == FolderTree::kNone) return std::nullopt;
   Statement statement = database.Prepare(sql);
-  statement.Bind(1, std::string_view(path));
-  return statement.Step() ? std::optional<StoredDocument>(ReadRow(statement)) : std::nullopt;
+  statement.Bind(1, folder).Bind(2, FolderTree::LeafOf(path));
+  return statement.Step() ? std::optional<StoredDocument>(ReadRow(statement, folder_path)) : std::nullopt;
 }
 
-std::optional<StoredDocument> FindDocument(Database& database, int64_t id) {
+std::optional<StoredDocument> FindDocument(Database& database, FolderTree& tree, int64_t id) {
   static const std::string sql = std::string(kSelectRow) + "WHERE id = ?1";
   Statement statement = database.Prepare(sql);
   statement.Bind(1, id);
-  return statement.Step() ? std::optional<StoredDocument>(ReadRow(statement)) : std::nullopt;
+  return statement.Step() ? std::optional<StoredDocument>(ReadRow(statement, tree)) : std::nullopt;
 }
 
 Totals LoadTotals(Database& database) {
@@ -95,16 +104,15 @@ void AddFieldNames(Database& database, FieldNames& names, const Json::Value& doc
   }
 }
 
-PrefixRange::PrefixRange(std::string prefix) : begin_(prefix) {
+std::string EndOfPrefix(std::string prefix) {
   while (!prefix.empty() && static_cast<unsigned char>(prefix.back()) == 0xFF) prefix.pop_back();
   if (!prefix.empty()) prefix.back() = static_cast<char>(static_cast<unsigned char>(prefix.back()) + 1);
-  end_ = prefix;
+  return prefix;
 }
 
-void PrefixRange::Bind(Statement& statement) const {
-  statement.Bind(1, std::string_view(begin_));
+void BindEnd(Statement& statement, int index, const std::string& end) {
   // SQLite orders any blob behind all texts.
-  end_.empty() ? statement.BindBlob(2, "") : statement.Bind(2, std::string_view(end_));
+  end.empty() ? statement.BindBlob(index, "") : statement.Bind(index, std::string_view(end));
 }
 
 int CompareNames(std::string_view a, std::string_view b) {

@@ -6,15 +6,17 @@
 #include <string_view>
 
 #include "services/kovaelasticd/store/document.h"
+#include "services/kovaelasticd/store/folder_tree.h"
 #include "services/kovaelasticd/store/sqlite_db.h"
 
 namespace ferrox::engine {
 
 // Rows of the tables "docs", "info" and "fields", for those who read and those who write.
 
-/// A document as the table "docs" has it.
+/// A document as the table "docs" has it, with the path that its folder gives it.
 struct StoredDocument {
   int64_t id = 0;
+  int64_t folder = FolderTree::kNone;
   int64_t text_bytes = 0;
   DocRow row;
 };
@@ -28,14 +30,17 @@ struct Totals {
 
 /// Selects what ReadRow reads; a condition is to follow.
 inline constexpr char kSelectRow[] =
-    "SELECT id, path, name, ext, kind, size, mtime, text_bytes, derived, error, packed FROM docs ";
-StoredDocument ReadRow(const Statement& statement);
-/// Binds a row to parameters 2 to 11, in the order of the table's columns.
-void BindRow(Statement& statement, const DocRow& row, int64_t text_bytes);
+    "SELECT id, folder, leaf, name, ext, kind, size, mtime, text_bytes, derived, error, packed FROM docs ";
+/// The row at hand; `folder_path` is that of its folder.
+StoredDocument ReadRow(const Statement& statement, std::string_view folder_path);
+StoredDocument ReadRow(const Statement& statement, FolderTree& tree);
+/// Binds a row in `folder` to parameters 2 to 12, in the order of the table's columns. All that is bound must live
+/// until the statement has run.
+void BindRow(Statement& statement, int64_t folder, const DocRow& row, int64_t text_bytes);
 
 /// By path or by number; nothing when there is none. @throws Error kEngineStorage, as all that follow.
-std::optional<StoredDocument> FindDocument(Database& database, const std::string& path);
-std::optional<StoredDocument> FindDocument(Database& database, int64_t id);
+std::optional<StoredDocument> FindDocument(Database& database, FolderTree& tree, const std::string& path);
+std::optional<StoredDocument> FindDocument(Database& database, FolderTree& tree, int64_t id);
 
 /// The table "info", as of the reader's snapshot or the writer's last SaveTotals.
 Totals LoadTotals(Database& database);
@@ -47,16 +52,10 @@ void LoadFieldNames(Database& database, FieldNames& names);
 /// @throws Error kEngineBadRequest when the index has too many names then.
 void AddFieldNames(Database& database, FieldNames& names, const Json::Value& document);
 
-/// Binds the range of all texts that begin with `prefix` to the parameters 1 (from) and 2 (before).
-class PrefixRange {
- public:
-  explicit PrefixRange(std::string prefix);
-  void Bind(Statement& statement) const;
-
- private:
-  std::string begin_;
-  std::string end_;  ///< "": no text lies behind the range
-};
+/// What comes right behind all texts that begin with `prefix`; "" when nothing does.
+std::string EndOfPrefix(std::string prefix);
+/// Binds such an end, so that texts are compared with it by "<".
+void BindEnd(Statement& statement, int index, const std::string& end);
 
 /// The order of names in the table: ASCII letters without case, then bytes.
 int CompareNames(std::string_view a, std::string_view b);

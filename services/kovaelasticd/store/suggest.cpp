@@ -49,8 +49,9 @@ std::vector<std::string> SuggestWord(Database& database, const std::string& word
   const size_t limit = word.size() < 6 ? 1 : 2;
   std::vector<Known> candidates;
   Statement statement = database.Prepare("SELECT word, documents FROM suggestions WHERE word >= ?1 AND word < ?2");
-  const PrefixRange range(word.substr(0, 1));  // the statement refers to its texts
-  range.Bind(statement);
+  const std::string begin = word.substr(0, 1);  // the statement refers to these texts
+  const std::string end = EndOfPrefix(begin);
+  BindEnd(statement.Bind(1, std::string_view(begin)), 2, end);
   while (statement.Step()) {
     const size_t distance = EditDistance(word, statement.Text(0), limit);
     if (distance == 0 || distance > limit) continue;

@@ -13,9 +13,15 @@ namespace {
 namespace names = fileindex::elastic;
 
 /// Found by their own means, or of no use to anybody who searches.
-constexpr const char* kNotPlain[] = {
-    field::kFsName,      field::kSearchName,        field::kDisplayName,          field::kKind,
-    field::kTextContent, names::kKOVAMDContentType, names::kKOVAMDContentTypeTree};
+constexpr const char* kNotPlain[] = {field::kPath,
+                                     field::kParent,
+                                     field::kFsName,
+                                     field::kSearchName,
+                                     field::kDisplayName,
+                                     field::kKind,
+                                     field::kTextContent,
+                                     names::kKOVAMDContentType,
+                                     names::kKOVAMDContentTypeTree};
 // Facts about a file with conditions of their own (path:, size:, date:), or numbers that nobody types.
 constexpr const char* kNotSearchable[] = {field::kPath,
                                           field::kParent,

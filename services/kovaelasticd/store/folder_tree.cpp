@@ -1,0 +1,107 @@
+#include "services/kovaelasticd/store/folder_tree.h"
+
+namespace ferrox::engine {
+
+template <typename Next>
+int64_t FolderTree::Descend(std::string_view folder_path, Next next) {
+  int64_t folder = kTop;
+  folder_path.remove_prefix(1);
+  while (folder != kNone && !folder_path.empty()) {
+    const std::string_view name = folder_path.substr(0, folder_path.find('/') + 1);
+    folder = next(folder, name);
+    folder_path.remove_prefix(name.size());
+  }
+  return folder;
+}
+
+int64_t FolderTree::Find(std::string_view folder_path) {
+  return Descend(folder_path, [this](int64_t parent, std::string_view name) { return ChildOf(parent, name); });
+}
+
+int64_t FolderTree::Make(std::string_view folder_path) {
+  return Descend(folder_path, [this](int64_t parent, std::string_view name) {
+    const int64_t there = ChildOf(parent, name);
+    return there != kNone ? there : AddChild(parent, name);
+  });
+}
+
+int64_t FolderTree::ChildOf(int64_t parent, std::string_view name) {
+  const auto kept = children_.find({parent, std::string(name)});
+  if (kept != children_.end()) return kept->second;
+  Statement statement = database_.Prepare("SELECT id FROM folders WHERE parent = ?1 AND name = ?2");
+  if (!statement.Bind(1, parent).Bind(2, name).Step()) return kNone;
+  const int64_t folder = statement.Int(0);
+  Keep(folder, {parent, std::string(name)});
+  return folder;
+}
+
+int64_t FolderTree::AddChild(int64_t parent, std::string_view name) {
+  database_.Prepare("INSERT INTO folders(parent, name) VALUES(?1, ?2)").Bind(1, parent).Bind(2, name).Run();
+  const int64_t folder = sqlite3_last_insert_rowid(database_.Handle());
+  Keep(folder, {parent, std::string(name)});
+  return folder;
+}
+
+FolderTree::Node FolderTree::NodeOf(int64_t folder) {
+  const auto kept = nodes_.find(folder);
+  if (kept != nodes_.end()) return kept->second;
+  Statement statement = database_.Prepare("SELECT parent, name FROM folders WHERE id = ?1");
+  if (!statement.Bind(1, folder).Step()) database_.Fail(SQLITE_CORRUPT);
+  Node node = {statement.Int(0), std::string(statement.Text(1))};
+  Keep(folder, node);
+  return node;
+}
+
+std::string FolderTree::PathOf(int64_t folder) {
+  constexpr size_t kPathMaxBytes = 1 << 16;  // longer than any path; only a damaged file has a circle
+  std::string reversed;
+  while (folder != kTop) {
+    const Node node = NodeOf(folder);
+    reversed.append(node.name.rbegin(), node.name.rend());
+    if (reversed.size() > kPathMaxBytes) database_.Fail(SQLITE_CORRUPT);
+    folder = node.parent;
+  }
+  return "/" + std::string(reversed.rbegin(), reversed.rend());
+}
+
+void FolderTree::Move(int64_t folder, std::string_view new_path) {
+  const std::string_view above = FolderOf(new_path.substr(0, new_path.size() - 1));
+  const int64_t parent = Make(above);
+  Node node = NodeOf(folder);
+  Statement statement = database_.Prepare("UPDATE folders SET parent = ?2, name = ?3 WHERE id = ?1");
+  statement.Bind(1, folder).Bind(2, parent).Bind(3, new_path.substr(above.size())).Run();
+  const int64_t parent_before = node.parent;
+  children_.erase({node.parent, std::move(node.name)});
+  Keep(folder, {parent, std::string(new_path.substr(above.size()))});
+  Prune(parent_before);
+}
+
+bool FolderTree::IsEmpty(int64_t folder) {
+  Statement document = database_.Prepare("SELECT 1 FROM docs WHERE folder = ?1 LIMIT 1");
+  if (document.Bind(1, folder).Step()) return false;
+  Statement child = database_.Prepare("SELECT 1 FROM folders WHERE parent = ?1 LIMIT 1");
+  return !child.Bind(1, folder).Step();
+}
+
+void FolderTree::Prune(int64_t folder) {
+  while (folder != kTop && IsEmpty(folder)) {
+    Node node = NodeOf(folder);
+    database_.Prepare("DELETE FROM folders WHERE id = ?1").Bind(1, folder).Run();
+    nodes_.erase(folder);
+    children_.erase({node.parent, std::move(node.name)});
+    folder = node.parent;
+  }
+}
+
+void FolderTree::Keep(int64_t folder, Node node) {
+  if (nodes_.size() >= kKeptMax) Forget();
+  children_[{node.parent, node.name}] = folder;
+  nodes_.insert_or_assign(folder, std::move(node));
+}
+
+void FolderTree::Forget() {
+  nodes_.clear();
+  children_.clear();
+}
+
+}  // namespace ferrox::engine

@@ -1,0 +1,71 @@
+#pragma once
+
+#include <cstdint>
+#include <map>
+#include <string>
+#include <string_view>
+#include <unordered_map>
+#include <utility>
+
+#include "services/kovaelasticd/store/sqlite_db.h"
+
+namespace ferrox::engine {
+
+/// The folders that an index's documents lie in: the table "folders" has a row for each, with the number of the folder
+/// above it and its own name. So a folder's path stands in one place, however many documents are below it.
+///
+/// A path's folder is all of it up to its last "/", the rest is its leaf: "/v/photo/a.jpg" has the leaf "a.jpg" in the
+/// folder "/v/photo/". Names end with their "/", since that is what their order among documents depends on: "/v/b-c"
+/// comes before "/v/b/x", and so does "b-c" before "b/". A folder is there as long as a document is below it; whether
+/// it has a document of its own, which lies in the folder above, is another matter.
+///
+/// For one thread at a time. What was read is kept, up to kKeptMax folders; whoever reads another snapshot than before,
+/// or rolls back, calls Forget. Every member throws Error kEngineStorage.
+class FolderTree {
+ public:
+  static constexpr int64_t kNone = 0;
+  static constexpr int64_t kTop = 1;  ///< the folder "/"
+
+  /// `database` must outlive this.
+  explicit FolderTree(Database& database) : database_(database) {}
+
+  /// The part of a path that is its folder, with the "/" at its end. "/" at least: paths are absolute.
+  static std::string_view FolderOf(std::string_view path) { return path.substr(0, path.rfind('/') + 1); }
+  static std::string_view LeafOf(std::string_view path) { return path.substr(path.rfind('/') + 1); }
+
+  /// The folder with that path, which ends with "/"; kNone when there is none.
+  int64_t Find(std::string_view folder_path);
+  /// The same; makes it, and those missing above it.
+  int64_t Make(std::string_view folder_path);
+  /// With "/" at its end.
+  std::string PathOf(int64_t folder);
+  /// Gives a folder, with all below it, the path `new_path`, which no folder has and which does not lie below it.
+  /// Prunes where it was.
+  void Move(int64_t folder, std::string_view new_path);
+  /// Removes the folder if nothing is in it, and then those above it for which that holds.
+  void Prune(int64_t folder);
+  /// Drops what was kept.
+  void Forget();
+
+ private:
+  static constexpr size_t kKeptMax = 4096;
+  struct Node {
+    int64_t parent;
+    std::string name;
+  };
+
+  Node NodeOf(int64_t folder);
+  int64_t ChildOf(int64_t parent, std::string_view name);
+  int64_t AddChild(int64_t parent, std::string_view name);
+  /// Follows the names of `folder_path` from the top. `next` gives the child of a folder, kNone to end.
+  template <typename Next>
+  int64_t Descend(std::string_view folder_path, Next next);
+  void Keep(int64_t folder, Node node);
+  bool IsEmpty(int64_t folder);
+
+  Database& database_;
+  std::unordered_map<int64_t, Node> nodes_;
+  std::map<std::pair<int64_t, std::string>, int64_t> children_;  ///< by parent and name, those of nodes_
+};
+
+}  // namespace ferrox::engine

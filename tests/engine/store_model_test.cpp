@@ -1,0 +1,203 @@
+// Catches documents that get lost in the tree of folders, or stand in another order than that of their paths' bytes:
+// random changes beside a model that knows whole paths only; and what an upgrade of an older file loses.
+#include <zstd.h>
+
+#include <fstream>
+#include <iterator>
+#include <map>
+#include <random>
+#include <set>
+
+#include <gtest/gtest.h>
+
+#include "base/path.h"
+#include "tests/engine/store_helpers.h"
+#include "tests/support/temp_dir.h"
+
+namespace ferrox::engine {
+namespace {
+
+Json::Value Moved(const std::string& path) {
+  Json::Value change;
+  change["KOVAMDPath"] = path;
+  return change;
+}
+
+class StoreModel {
+ public:
+  explicit StoreModel(uint32_t seed) : random_(seed) { Reopen(); }
+
+  void Step() {
+    switch (random_() % 12) {
+      case 0:
+        return Move(Path(), Path());
+      case 1:
+        return DeletePrefix();
+      case 2:
+        return Delete(Path());
+      case 3:
+        store_->Commit();
+        committed_ = paths_;
+        return Reopen();
+      case 4:
+        store_->Rollback();
+        paths_ = committed_;
+        return;
+      default:
+        return Put(Path());
+    }
+  }
+
+  void Check() {
+    const std::string prefix = Prefix();
+    const std::string after = random_() % 2 == 0 ? "" : Prefix();
+    const int64_t limit = random_() % 3 == 0 ? 2 : -1;
+    std::string expected, listed;
+    int64_t left = limit;
+    for (auto it = paths_.lower_bound(prefix); it != paths_.end() && it->starts_with(prefix); ++it) {
+      if (*it <= after || left == 0) continue;
+      expected += *it + "\n";
+      --left;
+    }
+    store_->Get({"", prefix, after, limit, {"KOVAMDPath"}},
+                [&](const Json::Value& entry) { listed += entry["KOVAMDPath"].asString() + "\n"; });
+    ASSERT_EQ(expected, listed) << "prefix " << prefix << " after " << after << " limit " << limit;
+  }
+
+  /// What searches see, which is what was committed.
+  void CheckSearch() {
+    const std::string folder = Path();
+    if (folder.find("//") != folder.npos || folder.back() == '/') return;  // nobody asks for such
+    int64_t expected = 0;
+    for (const std::string& path : committed_) expected += base::IsAtOrBelow(path, folder) ? 1 : 0;
+    ASSERT_EQ(expected, Find(*store_, "path:\"" + folder + "\"").total) << folder;
+    ASSERT_EQ(std::ssize(committed_), store_->Stat().documents);
+  }
+
+ private:
+  void Reopen() {
+    store_.reset();
+    store_ = std::make_unique<SqliteStore>(folder_ / "index.sqlite", true, PlainSchema());
+  }
+  std::string Path() {
+    static const char* const kNames[] = {"a", "a-b", "a0", "b", "\xFF", "\xC3\xA9", "", "A"};
+    std::string path;
+    for (size_t depth = 1 + random_() % 4; depth > 0; --depth) path += "/" + std::string(kNames[random_() % 8]);
+    return path;
+  }
+  std::string Prefix() {
+    const std::string path = Path();
+    return path.substr(0, 1 + random_() % path.size());
+  }
+  void Put(const std::string& path) {
+    store_->Upsert(path, FileDocument(path, "word"));
+    paths_.insert(path);
+  }
+  void Delete(const std::string& path) {
+    store_->Delete(path);
+    paths_.erase(path);
+  }
+  void DeletePrefix() {
+    const std::string prefix = Prefix();
+    if (prefix == "/") return;  // too seldom would anything be left
+    store_->DeletePrefix(prefix);
+    std::erase_if(paths_, [&](const std::string& path) { return path.starts_with(prefix); });
+  }
+  /// As the library moves a folder: its own document, then one by one each that was below; or all at once.
+  void Move(const std::string& from, const std::string& to) {
+    if (base::IsAtOrBelow(to, from) || base::IsAtOrBelow(from, to)) return;
+    std::map<std::string, std::string> moves;
+    for (const std::string& path : paths_) {
+      if (path == from || path.starts_with(from + "/")) moves[path] = to + path.substr(from.size());
+    }
+    const bool at_once = paths_.contains(from) && random_() % 2 == 0;
+    if (at_once) store_->MoveFolder(from, "", Moved(to));
+    for (const auto& [old_path, new_path] : moves) {
+      if (!at_once) store_->Set(old_path, Moved(new_path));
+      paths_.erase(old_path);
+      paths_.insert(new_path);
+    }
+  }
+
+  std::mt19937 random_;
+  test::TempDir folder_;
+  std::unique_ptr<IndexStore> store_;
+  std::set<std::string> paths_;
+  std::set<std::string> committed_;
+};
+
+TEST(StoreModelTest, AnySequenceOfChangesLeavesTheDocumentsOfTheModel) {
+  for (uint32_t seed = 1; seed <= 6; ++seed) {
+    SCOPED_TRACE(seed);
+    StoreModel model(seed);
+    for (int i = 0; i < 400; ++i) {
+      model.Step();
+      ASSERT_NO_FATAL_FAILURE(model.Check()) << "step " << i;
+      if (i % 10 != 0) continue;
+      ASSERT_NO_FATAL_FAILURE(model.CheckSearch()) << "step " << i;
+    }
+  }
+}
+
+/// An index as an engine of format 2 has written it.
+void UnpackKept(const std::string& to) {
+  std::ifstream packed_file(FERROX_TEST_DATA "/index_format_2.sqlite.zst", std::ios::binary);
+  const std::string packed((std::istreambuf_iterator<char>(packed_file)), {});
+  std::string bytes(ZSTD_getFrameContentSize(packed.data(), packed.size()), '\0');
+  ASSERT_EQ(bytes.size(), ZSTD_decompress(bytes.data(), bytes.size(), packed.data(), packed.size()));
+  std::ofstream(to, std::ios::binary) << bytes;
+}
+
+TEST(StoreUpgradeTest, AFileOfFormat2AnswersAsBefore) {
+  const test::TempDir folder;
+  UnpackKept(folder / "index.sqlite");
+  Json::Value mappings;
+  for (const char* name : {"KOVAMDPath", "KOVAMDParent"}) mappings["properties"][name]["_all"] = false;
+  SqliteStore store(folder / "index.sqlite", false, std::make_shared<Schema>(mappings));
+  std::string listed;
+  const auto list = [&listed](const Json::Value& entry) {
+    listed += entry["KOVAMDPath"].asString() + "|";
+    EXPECT_EQ(entry["KOVAMDPath"].asString(),
+              entry["KOVAMDParent"].asString() + "/" + entry["KOVAMDFSName"].asString());
+  };
+  store.Get({"", "/v/", "", -1, {}}, list);
+  EXPECT_EQ(listed,
+            "/v/other/deep/er/x.txt|/v/photo|/v/photo-list.txt|/v/photo/2023|/v/photo/2023/b|"
+            "/v/photo/2023/harbour.txt|/v/photo/notes.txt|");
+  listed.clear();
+  GetRequest suspects;
+  suspects.suspects = true;
+  store.Get(suspects, list);
+  EXPECT_EQ(listed, "/v/photo/2023/harbour.txt|") << "the file's other name has changed";
+  EXPECT_EQ(store.Stat().extract_error_examples["not text"], std::vector<std::string>{"/v/photo/notes.txt"});
+  EXPECT_EQ(FindPaths(store, "boats path:/v/photo"), "/v/photo/2023/b\n/v/photo/2023/harbour.txt\n/v/photo/notes.txt");
+  store.Delete("/v/photo/2023/harbour.txt");
+  store.MoveFolder("/v/photo", "", Moved("/v/pictures"));
+  store.Commit();
+  EXPECT_EQ(FindPaths(store, "boats path:/v/pictures"), "/v/pictures/2023/b\n/v/pictures/notes.txt");
+  EXPECT_EQ(FindPaths(store, "harbour"), "") << "its words could be taken out";
+}
+
+TEST(StoreUpgradeTest, AFileOfANewerFormatIsRefusedAndLeftAlone) {
+  const test::TempDir folder;
+  const std::string path = folder / "index.sqlite";
+  { const SqliteStore store(path, true, PlainSchema()); }
+  { Database(path, Database::Mode::kWrite).Execute("PRAGMA user_version = 99"); }
+  const auto content = [&path] {
+    std::ifstream file(path, std::ios::binary);
+    return std::string((std::istreambuf_iterator<char>(file)), {});
+  };
+  const std::string before = content();
+  try {
+    const SqliteStore store(path, true, PlainSchema());
+    FAIL() << "it was opened";
+  } catch (const IndexDamaged&) {
+    FAIL() << "it would be set aside";
+  } catch (const Error& error) {
+    EXPECT_NE(std::string(error.what()).find("format 99"), std::string::npos) << error.what();
+  }
+  EXPECT_EQ(before, content());
+}
+
+}  // namespace
+}  // namespace ferrox::engine
