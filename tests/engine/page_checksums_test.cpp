@@ -13,7 +13,6 @@
 #include <gtest/gtest.h>
 
 #include "base/scope_exit.h"
-#include "base/scope_exit.h"
 #include "services/kovaelasticd/store/scrubber.h"
 #include "services/kovaelasticd/store/sqlite_db.h"
 #include "tests/engine/store_helpers.h"
