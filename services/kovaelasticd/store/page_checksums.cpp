@@ -94,10 +94,10 @@ bool IsPageWhole(const uint8_t* page, size_t size, uint32_t number) {
 /// Hosts of either byte order may have begun the log; nearly always it was this one.
 bool IsFrameWhole(const uint8_t* header, const uint8_t* page, size_t size, const uint8_t* sum_before) {
   constexpr bool kLittle = std::endian::native == std::endian::little;
-  return IsLogSumOfFrame < kLittle ? LittleEndianWord
-         : BigEndianWord > (header, page, size, sum_before) || IsLogSumOfFrame < kLittle
-             ? BigEndianWord
-             : LittleEndianWord > (header, page, size, sum_before);
+  constexpr auto kOfThisHost = kLittle ? &LittleEndianWord : &BigEndianWord;
+  constexpr auto kOfTheOther = kLittle ? &BigEndianWord : &LittleEndianWord;
+  return IsLogSumOfFrame<kOfThisHost>(header, page, size, sum_before) ||
+         IsLogSumOfFrame<kOfTheOther>(header, page, size, sum_before);
 }
 
 }  // namespace ferrox::engine

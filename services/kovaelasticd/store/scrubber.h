@@ -6,6 +6,7 @@
 #include <string>
 #include <vector>
 
+#include "common/clock.h"
 #include "services/kovaelasticd/store/sqlite_db.h"
 
 namespace ferrox::engine {
@@ -23,7 +24,7 @@ namespace ferrox::engine {
 class Scrubber {
  public:
   using SteadyClock = std::chrono::steady_clock;
-  static constexpr int64_t kEverySec = 7 * 86400;
+  static constexpr int64_t kEverySec = 7 * kDaySec;
   static constexpr int64_t kTurnBytes = 1 << 20;
 
   /// `path` is the file of an index that somebody else keeps open.
