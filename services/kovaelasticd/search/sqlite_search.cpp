@@ -120,14 +120,16 @@ SearchReply Searcher::Run() {
   return reply;
 }
 
-SearchReply SqliteStore::Search(const SearchRequest& request) {
-  std::unique_ptr<StoreReader> reader = readers_.Borrow();
+SearchReply SearchIn(ReaderPool& readers, const SearchRequest& request) {
+  std::unique_ptr<StoreReader> reader = readers.Borrow();
   reader->database.Execute("BEGIN");
   reader->Refresh();
   SearchReply reply = Searcher(*reader, request).Run();
   reader->database.Execute("COMMIT");
-  readers_.Return(std::move(reader));
+  readers.Return(std::move(reader));
   return reply;
 }
+
+SearchReply SqliteStore::Search(const SearchRequest& request) { return SearchIn(readers_, request); }
 
 }  // namespace ferrox::engine

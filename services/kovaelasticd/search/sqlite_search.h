@@ -36,4 +36,7 @@ class Searcher {
   const SearchRequest& request_;
 };
 
+/// The search with a connection of `readers`. @throws Error kEngineStorage, IndexDamaged.
+SearchReply SearchIn(ReaderPool& readers, const SearchRequest& request);
+
 }  // namespace ferrox::engine

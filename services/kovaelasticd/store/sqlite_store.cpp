@@ -1,7 +1,5 @@
 #include "services/kovaelasticd/store/sqlite_store.h"
 
-#include <sys/stat.h>
-
 #include <algorithm>
 #include <iterator>
 #include <limits>
@@ -11,6 +9,7 @@
 #include "services/kovaelasticd/store/index_files.h"
 #include "services/kovaelasticd/store/path_walk.h"
 #include "services/kovaelasticd/store/store_format.h"
+#include "services/kovaelasticd/store/store_stat.h"
 #include "services/kovaelasticd/store/suggest.h"
 
 namespace ferrox::engine {
@@ -19,11 +18,6 @@ namespace {
 
 /// The write-ahead log is cut after a transaction that made it longer than this many bytes.
 constexpr int64_t kLogMaxBytes = 16 << 20;
-
-int64_t BytesOnDisk(const std::string& path) {
-  struct stat status = {};
-  return stat(path.c_str(), &status) == 0 ? int64_t{status.st_blocks} * 512 : 0;
-}
 
 Database::Mode OpeningMode(const std::string& path, bool create) {
   return create && !IsFileExist(path) ? Database::Mode::kCreate : Database::Mode::kWrite;
@@ -133,33 +127,6 @@ void SqliteStore::RebuildSuggestions() {
   uncommitted_bytes_ += 1;  // so that there is something to commit
 }
 
-StoreStat SqliteStore::Stat() {
-  StoreStat stat;
-  std::unique_ptr<StoreReader> reader = readers_.Borrow();
-  reader->database.Execute("BEGIN");
-  reader->Refresh();
-  {
-    const Totals totals = LoadTotals(reader->database);
-    stat.documents = totals.documents;
-    stat.with_content = totals.with_content;
-    stat.text_bytes = totals.text_bytes;
-    Statement errors = reader->database.Prepare(
-        "SELECT error, count(*), min(id), max(id) FROM docs WHERE error IS NOT NULL GROUP BY error");
-    while (errors.Step()) {
-      const std::string reason(errors.Text(0));
-      stat.extract_errors[reason] = errors.Int(1);
-      for (int column = 2; column <= (errors.Int(1) == 1 ? 2 : 3); ++column) {
-        const auto example = FindDocument(reader->database, reader->tree, errors.Int(column));
-        if (example.has_value()) stat.extract_error_examples[reason].push_back(example->row.path);
-      }
-    }
-  }
-  reader->database.Execute("COMMIT");
-  readers_.Return(std::move(reader));
-  for (const char* suffix : {"", "-wal", "-shm"}) {
-    stat.bytes_on_disk += BytesOnDisk(writer_.Path() + suffix);
-  }
-  return stat;
-}
+StoreStat SqliteStore::Stat() { return ReadStat(readers_); }
 
 }  // namespace ferrox::engine
