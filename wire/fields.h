@@ -59,8 +59,9 @@ inline constexpr const char* kFieldNames[] = {FERROX_FIELD_NAMES(FERROX_LIST_FIE
 #undef FERROX_LIST_FIELD
 
 // Members of stored documents that are for programs: they are no fields of the schema, and not in kFieldNames.
-inline constexpr char k_KOVAStamp[] = "_KOVAStamp";        ///< text: differs when size, times or inode do; ends in the
-                                                           ///< last "." and the inode's number
+inline constexpr char k_KOVAStamp[] = "_KOVAStamp";    ///< text: differs when size, times or inode do; ends in the
+                                                       ///< last "." and the inode's number
+inline constexpr char k_KOVAAccess[] = "_KOVAAccess";  ///< text: owner, group, mode and ACL (docs/formats/engine.md)
 inline constexpr char k_KOVANeedMeta[] = "_KOVANeedMeta";  ///< bool: the content was wanted when it was written
 inline constexpr char k_KOVAExtractVersion[] = "_KOVAExtractVersion";  ///< int: of the reader; 0: there is none
 inline constexpr char k_KOVAExtractError[] = "_KOVAExtractError";  ///< text: why content, or a part, could not be read

@@ -2,9 +2,11 @@
 
 #include <fcntl.h>
 #include <sys/stat.h>
+#include <sys/xattr.h>
 #include <unistd.h>
 
 #include <atomic>
+#include <cstring>
 #include <filesystem>
 #include <stdexcept>
 #include <string>
@@ -175,6 +177,44 @@ TEST_F(ContentExtractTest, TheStampFollowsTheFile) {
   std::filesystem::rename(dir_ / "b", dir_ / "a");
   EXPECT_NE(attributes, Parse("a", false)["_KOVAStamp"].asString());
   EXPECT_FALSE(KOVA::CONTENT_EXTRACT::SameFile(attributes, Parse("a", false)["_KOVAStamp"].asString()));
+}
+
+TEST_F(ContentExtractTest, RightsAreThoseOfModeAndAcl) {
+  WriteFile(dir_ / "a", "1");
+  const string ids = std::to_string(geteuid()) + ":" + std::to_string(getegid());
+  const auto access = [this] { return Parse("a", false)["_KOVAAccess"].asString(); };
+  ASSERT_EQ(0, chmod((dir_ / "a").c_str(), 04604));
+  EXPECT_EQ(ids + ":4604", access());
+  // Version 2; owner rw, 5001 r, 4000000000 none, group r, 200 rw, mask r, others none.
+  const string none("\xff\xff\xff\xff", 4);
+  const string acl = string("\2\0\0\0\1\0\6\0", 8) + none + string("\2\0\4\0\x89\x13\0\0\2\0\0\0\0\x28\x6b\xee", 16) +
+                     string("\4\0\4\0", 4) + none + string("\x8\0\6\0\xc8\0\0\0\x10\0\4\0", 12) + none +
+                     string("\x20\0\0\0", 4) + none;
+  if (setxattr((dir_ / "a").c_str(), "system.posix_acl_access", acl.data(), acl.size(), 0) != 0) {
+    GTEST_SKIP() << "no ACLs here: " << strerror(errno);
+  }
+  EXPECT_EQ(ids + ":4640:u5001=4,u4000000000=0,g=4,g200=6", access());
+  ASSERT_EQ(0, removexattr((dir_ / "a").c_str(), "system.posix_acl_access"));
+  EXPECT_EQ(ids + ":4640", access()) << "the mask has become the group's bits";
+}
+
+TEST_F(ContentExtractTest, AFileWhoseRightsDoNotStayTheSameIsItsNameAlone) {
+  WriteFile(dir_ / "a.txt", "word");
+  std::atomic<bool> stop = false;
+  std::thread changes([&] {
+    for (unsigned mode = 0; !stop; ++mode) (void)chmod((dir_ / "a.txt").c_str(), 0400 | mode % 0400);
+  });
+  Json::Value unsettled = Parse("a.txt");  // where the thread gets no processor, nothing changes
+  for (int i = 0; i < 2000 && unsettled.isMember("KOVAMDTextContent"); ++i) unsettled = Parse("a.txt");
+  stop = true;
+  changes.join();
+  EXPECT_FALSE(unsettled.isMember("KOVAMDTextContent"));
+  EXPECT_EQ("its rights kept changing while it was read", unsettled["_KOVAExtractError"].asString());
+  EXPECT_EQ("text/plain", unsettled["KOVAMDContentType"].asString());
+  const Json::Value settled = Parse("a.txt");
+  EXPECT_EQ("word", settled["KOVAMDTextContent"].asString());
+  EXPECT_FALSE(
+      KOVA::CONTENT_EXTRACT::SameContent(settled["_KOVAStamp"].asString(), unsettled["_KOVAStamp"].asString()));
 }
 
 }  // namespace

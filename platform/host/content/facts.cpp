@@ -1,6 +1,7 @@
 #include "platform/host/content/facts.h"
 
 #include <fcntl.h>
+#include <sys/sysmacros.h>
 
 #include <algorithm>
 #include <cerrno>
@@ -8,6 +9,7 @@
 #include <stdexcept>
 
 #include "base/text.h"
+#include "platform/host/content/access_record.h"
 #include "platform/shared/stamp.h"
 #include "wire/fields.h"
 
@@ -24,6 +26,10 @@ std::string ExtensionOf(const std::string& name) {
   const size_t dot = name.rfind('.');
   if (dot == std::string::npos) return {};
   return base::LowerAscii(name.substr(dot + 1));
+}
+
+Rights RightsOf(const struct statx& info) {
+  return {info.stx_uid, info.stx_gid, info.stx_mode, makedev(info.stx_dev_major, info.stx_dev_minor)};
 }
 
 std::string Stamp(const struct statx& info) {
@@ -73,6 +79,7 @@ Facts AddFacts(const std::string& path, Json::Value& document) {
   const size_t slash = path.rfind('/');
   const std::string name = path.substr(slash + 1);
   facts.extension = ExtensionOf(name);
+  facts.access = AccessRecord(path, RightsOf(facts.info));
   document = Json::Value(Json::objectValue);
   document[field::kKOVAMDPath] = path;
   document[field::kKOVAMDParent] = slash == std::string::npos ? std::string() : path.substr(0, slash);
@@ -84,6 +91,7 @@ Facts AddFacts(const std::string& path, Json::Value& document) {
   document[field::kKOVAMDOwnerUserID] = std::to_string(facts.info.stx_uid);
   document[field::kKOVAMDOwnerGroupID] = std::to_string(facts.info.stx_gid);
   document[field::k_KOVAStamp] = Stamp(facts.info);
+  document[field::k_KOVAAccess] = facts.access;
   AddSizesAndDates(facts.info, document);
   return facts;
 }

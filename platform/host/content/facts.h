@@ -11,6 +11,7 @@ namespace kova::content {
 /// What is known of a file without opening it.
 struct Facts {
   std::string extension;  ///< in lower case
+  std::string access;     ///< as KOVA::CONTENT_EXTRACT::Access gives it
   struct statx info = {};
 };
 

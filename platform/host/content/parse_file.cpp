@@ -1,5 +1,6 @@
 #include <sys/stat.h>
 
+#include <cstdint>
 #include <stdexcept>
 #include <string>
 #include <utility>
@@ -9,9 +10,11 @@
 #include <kova/content_extract.h>
 #include <kova/content_type.h>
 
+#include "platform/host/content/access_record.h"
 #include "platform/host/content/extract_client.h"
 #include "platform/host/content/facts.h"
 #include "platform/host/content/programs.h"
+#include "platform/shared/stamp.h"
 #include "wire/fields.h"
 
 namespace kova::content {
@@ -19,6 +22,9 @@ namespace kova::content {
 namespace {
 
 namespace field = ferrox::fileindex::elastic;
+
+/// So many times the content of a file is read whose rights change meanwhile.
+constexpr int kReadsMax = 3;
 
 /// Whether another file has taken the place of the one that was examined. There are file systems on which the numbers
 /// of an open file are always others than those of its path.
@@ -42,6 +48,35 @@ bool WantsContent(const Json::Value& config) {
          config["need_meta"].asBool();
 }
 
+/// Makes the document of the file as it is now, with its content where that is wanted.
+/// @return whether its rights were the same before the content was read and afterwards.
+bool Parse(const std::string& path, bool wants_content, Facts& facts, Json::Value& document) {
+  facts = AddFacts(path, document);
+  const char* special = TypeByMode(facts.info.stx_mode);
+  const char* type = special != nullptr ? special : TypeByExtension(facts.extension);
+  if (type != nullptr) document[field::kKOVAMDContentType] = type;
+  if (!wants_content || S_ISDIR(facts.info.stx_mode)) return true;
+  document[field::k_KOVANeedMeta] = true;
+  document[field::k_KOVAExtractVersion] = KOVA::CONTENT_EXTRACT::ExtractVersion(type != nullptr ? type : "");
+  if (special != nullptr) {
+    document[field::k_KOVAExtractError] = "not a regular file";
+  } else if (facts.info.stx_size > 0 && (type == nullptr || FormatOf(type) != nullptr)) {
+    AddContent(path, facts, document);
+    return AccessRecord(path) == facts.access;
+  }
+  return true;
+}
+
+/// Says of the document of a name why it has no content, so that it is tried again: a stamp of no content is none that
+/// the file has.
+void MarkUnsettled(const Facts& facts, Json::Value& document) {
+  document[field::k_KOVANeedMeta] = true;
+  document[field::k_KOVAExtractVersion] = 0;
+  document[field::k_KOVAExtractError] = "its rights kept changing while it was read";
+  const int64_t changed = Nanoseconds(facts.info.stx_ctime.tv_sec, facts.info.stx_ctime.tv_nsec);
+  document[field::k_KOVAStamp] = StampText(0, 0, changed, facts.info.stx_ino);
+}
+
 }  // namespace
 
 }  // namespace kova::content
@@ -51,18 +86,12 @@ namespace KOVA::CONTENT_EXTRACT {
 void ParseFile(const std::string& path, const Json::Value& config, Json::Value& document) {
   using namespace kova::content;
   ClearExtractionProblem();
-  const Facts facts = AddFacts(path, document);
-  const char* special = TypeByMode(facts.info.stx_mode);
-  const char* type = special != nullptr ? special : TypeByExtension(facts.extension);
-  if (type != nullptr) document[field::kKOVAMDContentType] = type;
-  if (!WantsContent(config) || S_ISDIR(facts.info.stx_mode)) return;
-  document[field::k_KOVANeedMeta] = true;
-  document[field::k_KOVAExtractVersion] = ExtractVersion(type != nullptr ? type : "");
-  if (special != nullptr) {
-    document[field::k_KOVAExtractError] = "not a regular file";
-  } else if (facts.info.stx_size > 0 && (type == nullptr || FormatOf(type) != nullptr)) {
-    AddContent(path, facts, document);
+  Facts facts;
+  for (int read = 0; read < kReadsMax; ++read) {
+    if (Parse(path, WantsContent(config), facts, document)) return;
   }
+  (void)Parse(path, false, facts, document);
+  if (!S_ISDIR(facts.info.stx_mode)) MarkUnsettled(facts, document);
 }
 
 int ExtractVersion(const std::string& content_type) {
