@@ -90,6 +90,18 @@ Json::Value MoveFolderRequest(const std::string& index_id, const std::string& pa
   return request;
 }
 
+Json::Value AccessSetRequest(const std::string& index_id, const std::vector<SeenAccess>& records) {
+  Json::Value request = IndexRequest("access_set", index_id);
+  Json::Value& sent = request["data"]["records"] = Json::Value(Json::arrayValue);
+  for (const SeenAccess& record : records) {
+    Json::Value& entry = sent.append(Json::Value(Json::objectValue));
+    entry["path"] = record.path;
+    entry["stamp"] = record.stamp;
+    entry["access"] = record.access;
+  }
+  return request;
+}
+
 Json::Value DeleteDocumentRequest(const std::string& index_id, const std::string& path) {
   return DocumentRequest("document_del_by_id", index_id, path);
 }

@@ -40,6 +40,15 @@ Json::Value SetDocumentRequest(const std::string& index_id, const Json::Value& d
 /// when its "_KOVAStamp" is not `stamp`; "": it may be any.
 Json::Value MoveFolderRequest(const std::string& index_id, const std::string& path, const std::string& stamp,
                               Json::Value members);
+/// What was seen of a file at `path`: its "_KOVAStamp" and "_KOVAAccess".
+struct SeenAccess {
+  std::string path;
+  std::string stamp;
+  std::string access;
+};
+/// Sets the rights of documents, without a look at anything else of theirs where the stamps tell that their content is
+/// the same. At most 10,000 records.
+Json::Value AccessSetRequest(const std::string& index_id, const std::vector<SeenAccess>& records);
 Json::Value DeleteDocumentRequest(const std::string& index_id, const std::string& path);
 
 // Documents by a query.

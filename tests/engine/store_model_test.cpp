@@ -1,16 +1,17 @@
-// Catches documents that get lost in the tree of folders, or stand in another order than that of their paths' bytes:
-// random changes beside a model that knows whole paths only; and what an upgrade of an older file loses.
+// Catches documents that get lost in the tree of folders, stand in another order than that of their paths' bytes, or
+// have another's access record, which folders have, too: random changes beside a model that knows whole paths only; and
+// what an upgrade of an older file loses.
 #include <zstd.h>
 
 #include <fstream>
 #include <iterator>
 #include <map>
 #include <random>
-#include <set>
 
 #include <gtest/gtest.h>
 
 #include "base/path.h"
+#include "services/kovaelasticd/store/access_records.h"
 #include "tests/engine/store_helpers.h"
 #include "tests/support/temp_dir.h"
 
@@ -37,11 +38,11 @@ class StoreModel {
         return Delete(Path());
       case 3:
         store_->Commit();
-        committed_ = paths_;
+        committed_ = files_;
         return Reopen();
       case 4:
         store_->Rollback();
-        paths_ = committed_;
+        files_ = committed_;
         return;
       default:
         return Put(Path());
@@ -54,13 +55,14 @@ class StoreModel {
     const int64_t limit = random_() % 3 == 0 ? 2 : -1;
     std::string expected, listed;
     int64_t left = limit;
-    for (auto it = paths_.lower_bound(prefix); it != paths_.end() && it->starts_with(prefix); ++it) {
-      if (*it <= after || left == 0) continue;
-      expected += *it + "\n";
+    for (auto it = files_.lower_bound(prefix); it != files_.end() && it->first.starts_with(prefix); ++it) {
+      if (it->first <= after || left == 0) continue;
+      expected += it->first + " " + it->second.access + "\n";
       --left;
     }
-    store_->Get({"", prefix, after, limit, {"KOVAMDPath"}},
-                [&](const Json::Value& entry) { listed += entry["KOVAMDPath"].asString() + "\n"; });
+    store_->Get({"", prefix, after, limit, {"KOVAMDPath", "_KOVAAccess"}}, [&](const Json::Value& entry) {
+      listed += entry["KOVAMDPath"].asString() + " " + entry["_KOVAAccess"].asString() + "\n";
+    });
     ASSERT_EQ(expected, listed) << "prefix " << prefix << " after " << after << " limit " << limit;
   }
 
@@ -69,12 +71,36 @@ class StoreModel {
     const std::string folder = Path();
     if (folder.find("//") != folder.npos || folder.back() == '/') return;  // nobody asks for such
     int64_t expected = 0;
-    for (const std::string& path : committed_) expected += base::IsAtOrBelow(path, folder) ? 1 : 0;
+    for (const auto& [path, file] : committed_) expected += base::IsAtOrBelow(path, folder) ? 1 : 0;
     ASSERT_EQ(expected, Find(*store_, "path:\"" + folder + "\"").total) << folder;
     ASSERT_EQ(std::ssize(committed_), store_->Stat().documents);
+    const auto lacks = [](const auto& entry) { return entry.second.access.empty(); };
+    ASSERT_EQ(std::count_if(committed_.begin(), committed_.end(), lacks), store_->Stat().without_access);
+  }
+
+  /// Each committed folder has the record of its own document.
+  void CheckFolders() {
+    Database database(folder_ / "index.sqlite", Database::Mode::kRead);
+    FolderTree tree(database);
+    std::map<int64_t, std::string> records = {{0, ""}};
+    ReadAccessRecords(database, 1, 1000,
+                      [&](const AccessRecord& record) { records[record.number] = AccessText(record); });
+    for (const auto& [path, file] : committed_) {
+      for (size_t end = path.rfind('/'); end > 0; end = path.rfind('/', end - 1)) {
+        const auto own = committed_.find(path.substr(0, end));
+        const bool has = own != committed_.end() && own->second.is_folder;
+        const int64_t folder = tree.Find(path.substr(0, end + 1));
+        ASSERT_EQ(has ? own->second.access : "", records[tree.AccessOf(folder)]) << path.substr(0, end + 1);
+      }
+    }
   }
 
  private:
+  struct File {
+    std::string access;
+    bool is_folder;
+  };
+
   void Reopen() {
     store_.reset();
     store_ = std::make_unique<SqliteStore>(folder_ / "index.sqlite", true, PlainSchema());
@@ -89,41 +115,48 @@ class StoreModel {
     const std::string path = Path();
     return path.substr(0, 1 + random_() % path.size());
   }
+  std::string Access() {
+    static const char* const kAccess[] = {"", "0:0:0755", "1000:100:2640", "0:0:0604:u5001=4,u7=0,g=7,g200=6"};
+    return kAccess[random_() % 4];
+  }
   void Put(const std::string& path) {
-    store_->Upsert(path, FileDocument(path, "word"));
-    paths_.insert(path);
+    Json::Value document = FileDocument(path, "word");
+    const File file = {Access(), random_() % 2 == 0};
+    document["KOVAMDIsDir"] = file.is_folder;
+    if (!file.access.empty()) document["_KOVAAccess"] = file.access;
+    store_->Upsert(path, document);
+    files_[path] = file;
   }
   void Delete(const std::string& path) {
     store_->Delete(path);
-    paths_.erase(path);
+    files_.erase(path);
   }
   void DeletePrefix() {
     const std::string prefix = Prefix();
     if (prefix == "/") return;  // too seldom would anything be left
     store_->DeletePrefix(prefix);
-    std::erase_if(paths_, [&](const std::string& path) { return path.starts_with(prefix); });
+    std::erase_if(files_, [&](const auto& file) { return file.first.starts_with(prefix); });
   }
   /// As the library moves a folder: its own document, then one by one each that was below; or all at once.
   void Move(const std::string& from, const std::string& to) {
     if (base::IsAtOrBelow(to, from) || base::IsAtOrBelow(from, to)) return;
     std::map<std::string, std::string> moves;
-    for (const std::string& path : paths_) {
+    for (const auto& [path, file] : files_) {
       if (path == from || path.starts_with(from + "/")) moves[path] = to + path.substr(from.size());
     }
-    const bool at_once = paths_.contains(from) && random_() % 2 == 0;
+    const bool at_once = files_.contains(from) && random_() % 2 == 0;
     if (at_once) store_->MoveFolder(from, "", Moved(to));
     for (const auto& [old_path, new_path] : moves) {
       if (!at_once) store_->Set(old_path, Moved(new_path));
-      paths_.erase(old_path);
-      paths_.insert(new_path);
+      files_.insert_or_assign(new_path, files_.extract(old_path).mapped());
     }
   }
 
   std::mt19937 random_;
   test::TempDir folder_;
   std::unique_ptr<IndexStore> store_;
-  std::set<std::string> paths_;
-  std::set<std::string> committed_;
+  std::map<std::string, File> files_;
+  std::map<std::string, File> committed_;
 };
 
 TEST(StoreModelTest, AnySequenceOfChangesLeavesTheDocumentsOfTheModel) {
@@ -135,6 +168,7 @@ TEST(StoreModelTest, AnySequenceOfChangesLeavesTheDocumentsOfTheModel) {
       ASSERT_NO_FATAL_FAILURE(model.Check()) << "step " << i;
       if (i % 10 != 0) continue;
       ASSERT_NO_FATAL_FAILURE(model.CheckSearch()) << "step " << i;
+      ASSERT_NO_FATAL_FAILURE(model.CheckFolders()) << "step " << i;
     }
   }
 }

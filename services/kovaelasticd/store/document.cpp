@@ -234,7 +234,7 @@ DocRow PackDocument(const std::string& path, const Json::Value& document, const 
                                                 : static_cast<int32_t>(fileindex::GetFileTypeByFullPath("." + row.ext));
   for (auto member = document.begin(); member != document.end(); ++member) {
     const std::string name = member.name();
-    if (name == field::kTextContent) continue;
+    if (name == field::kTextContent || name == field::kAccess) continue;
     const int derived = DerivedIndex(name);
     if (derived >= 0 && kDerived[derived].value(row) == *member) {
       row.derived |= 1U << derived;
@@ -250,7 +250,7 @@ std::vector<std::string> NamesNeeded(const Json::Value& document, const FieldNam
   std::vector<std::string> needed;
   for (auto member = document.begin(); member != document.end(); ++member) {
     const std::string name = member.name();
-    if (names.NumberOf(name) == 0) needed.push_back(name);
+    if (name != field::kAccess && names.NumberOf(name) == 0) needed.push_back(name);
   }
   return needed;
 }

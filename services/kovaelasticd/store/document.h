@@ -40,7 +40,8 @@ struct DocRow {
   std::optional<int64_t> mtime;
   uint32_t derived = 0;  ///< bits of the fields that follow from the columns
   std::string error;     ///< why its content could not be read; empty when nothing is wrong
-  std::string packed;    ///< all other fields except the text content
+  std::string packed;    ///< all other fields except the text content and the access record
+  int64_t access = 0;    ///< number of its access record; 0: none
 };
 
 /// The texts of a document that are searched, beside its content: the columns of meta_fts. They follow from the
@@ -64,11 +65,12 @@ inline constexpr char kFieldEnd = '\x1F';
 /// The word by which a number in a field is found; words of one field have the order of their numbers.
 std::string RangeWord(const std::string& field_name, int64_t number);
 
-/// The row of a document. `names` must know every member (see NamesNeeded).
+/// The row of a document, without its access record. `names` must know every member (see NamesNeeded).
 DocRow PackDocument(const std::string& path, const Json::Value& document, const FieldNames& names);
 /// The members of `document` whose names `names` does not know yet.
 std::vector<std::string> NamesNeeded(const Json::Value& document, const FieldNames& names);
-/// The fields of a stored document, without its text content; only those in `wanted` unless that is empty.
+/// The fields of a stored document, without text content and access record; only those in `wanted` unless that is
+/// empty.
 Json::Value UnpackDocument(const DocRow& row, const FieldNames& names, const std::vector<std::string>& wanted);
 
 /// The searched texts of a document that is stored as `row`.

@@ -1,5 +1,7 @@
 #include "services/kovaelasticd/store/folder_tree.h"
 
+#include "services/kovaelasticd/text/schema.h"
+
 namespace ferrox::engine {
 
 template <typename Next>
@@ -28,26 +30,35 @@ int64_t FolderTree::Make(std::string_view folder_path) {
 int64_t FolderTree::ChildOf(int64_t parent, std::string_view name) {
   const auto kept = children_.find({parent, std::string(name)});
   if (kept != children_.end()) return kept->second;
-  Statement statement = database_.Prepare("SELECT id FROM folders WHERE parent = ?1 AND name = ?2");
+  Statement statement = database_.Prepare("SELECT id, access FROM folders WHERE parent = ?1 AND name = ?2");
   if (!statement.Bind(1, parent).Bind(2, name).Step()) return kNone;
   const int64_t folder = statement.Int(0);
-  Keep(folder, {parent, std::string(name)});
+  Keep(folder, {parent, std::string(name), statement.Int(1)});
   return folder;
 }
 
 int64_t FolderTree::AddChild(int64_t parent, std::string_view name) {
-  database_.Prepare("INSERT INTO folders(parent, name) VALUES(?1, ?2)").Bind(1, parent).Bind(2, name).Run();
+  const int64_t access = AccessOfDocument(parent, name).value_or(0);
+  Statement statement = database_.Prepare("INSERT INTO folders(parent, name, access) VALUES(?1, ?2, ?3)");
+  statement.Bind(1, parent).Bind(2, name).Bind(3, access).Run();
   const int64_t folder = sqlite3_last_insert_rowid(database_.Handle());
-  Keep(folder, {parent, std::string(name)});
+  Keep(folder, {parent, std::string(name), access});
   return folder;
+}
+
+/// The record of the document that is the folder's own; nothing where there is none.
+std::optional<int64_t> FolderTree::AccessOfDocument(int64_t parent, std::string_view name) {
+  Statement statement = database_.Prepare("SELECT access FROM docs WHERE folder = ?1 AND leaf = ?2 AND kind = ?3");
+  statement.Bind(1, parent).Bind(2, name.substr(0, name.size() - 1)).Bind(3, int64_t{kFolder});
+  return statement.Step() ? std::optional(statement.Int(0)) : std::nullopt;
 }
 
 FolderTree::Node FolderTree::NodeOf(int64_t folder) {
   const auto kept = nodes_.find(folder);
   if (kept != nodes_.end()) return kept->second;
-  Statement statement = database_.Prepare("SELECT parent, name FROM folders WHERE id = ?1");
+  Statement statement = database_.Prepare("SELECT parent, name, access FROM folders WHERE id = ?1");
   if (!statement.Bind(1, folder).Step()) database_.Fail(SQLITE_CORRUPT);
-  Node node = {statement.Int(0), std::string(statement.Text(1))};
+  Node node = {statement.Int(0), std::string(statement.Text(1)), statement.Int(2)};
   Keep(folder, node);
   return node;
 }
@@ -68,12 +79,22 @@ void FolderTree::Move(int64_t folder, std::string_view new_path) {
   const std::string_view above = FolderOf(new_path.substr(0, new_path.size() - 1));
   const int64_t parent = Make(above);
   Node node = NodeOf(folder);
-  Statement statement = database_.Prepare("UPDATE folders SET parent = ?2, name = ?3 WHERE id = ?1");
-  statement.Bind(1, folder).Bind(2, parent).Bind(3, new_path.substr(above.size())).Run();
+  const std::string_view name = new_path.substr(above.size());
+  const int64_t access = AccessOfDocument(parent, name).value_or(node.access);
+  Statement statement = database_.Prepare("UPDATE folders SET parent = ?2, name = ?3, access = ?4 WHERE id = ?1");
+  statement.Bind(1, folder).Bind(2, parent).Bind(3, name).Bind(4, access).Run();
   const int64_t parent_before = node.parent;
   children_.erase({node.parent, std::move(node.name)});
-  Keep(folder, {parent, std::string(new_path.substr(above.size()))});
+  Keep(folder, {parent, std::string(name), access});
   Prune(parent_before);
+}
+
+void FolderTree::SetAccess(int64_t folder, int64_t access) {
+  Node node = NodeOf(folder);
+  if (node.access == access) return;
+  database_.Prepare("UPDATE folders SET access = ?2 WHERE id = ?1").Bind(1, folder).Bind(2, access).Run();
+  node.access = access;
+  Keep(folder, std::move(node));
 }
 
 bool FolderTree::IsEmpty(int64_t folder) {

@@ -2,6 +2,7 @@
 
 #include <cstdint>
 #include <map>
+#include <optional>
 #include <string>
 #include <string_view>
 #include <unordered_map>
@@ -42,6 +43,10 @@ class FolderTree {
   /// Gives a folder, with all below it, the path `new_path`, which no folder has and which does not lie below it.
   /// Prunes where it was.
   void Move(int64_t folder, std::string_view new_path);
+  /// The number of a folder's access record; 0: none. It is that of the folder's own document where there is one, which
+  /// whoever changes that document sees to; a folder that is made or moved takes it over by itself.
+  int64_t AccessOf(int64_t folder) { return NodeOf(folder).access; }
+  void SetAccess(int64_t folder, int64_t access);
   /// Removes the folder if nothing is in it, and then those above it for which that holds.
   void Prune(int64_t folder);
   /// Drops what was kept.
@@ -52,9 +57,11 @@ class FolderTree {
   struct Node {
     int64_t parent;
     std::string name;
+    int64_t access;
   };
 
   Node NodeOf(int64_t folder);
+  std::optional<int64_t> AccessOfDocument(int64_t parent, std::string_view name);
   int64_t ChildOf(int64_t parent, std::string_view name);
   int64_t AddChild(int64_t parent, std::string_view name);
   /// Follows the names of `folder_path` from the top. `next` gives the child of a folder, kNone to end.

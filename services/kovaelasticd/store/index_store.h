@@ -66,6 +66,7 @@ struct StoreStat {
   int64_t with_content = 0;                       ///< of these, those with text
   int64_t bytes_on_disk = 0;                      ///< of all its files
   int64_t text_bytes = 0;                         ///< of all texts, unpacked
+  int64_t without_access = 0;                     ///< documents that have no access record
   std::map<std::string, int64_t> extract_errors;  ///< documents for each reason why content could not be read
   std::map<std::string, std::vector<std::string>> extract_error_examples;  ///< of each reason, one or two paths
 };

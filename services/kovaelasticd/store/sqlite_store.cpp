@@ -71,6 +71,7 @@ void SqliteStore::Rollback() {
   // A failure may have ended the transaction already.
   if (sqlite3_get_autocommit(writer_.Handle()) == 0) writer_.Execute("ROLLBACK");
   tree_.Forget();
+  access_.Forget();
   names_ = FieldNames();
   LoadFieldNames(writer_, names_);
   totals_ = LoadTotals(writer_);
@@ -82,8 +83,12 @@ void SqliteStore::LimitPages(int64_t pages) {
 
 Json::Value SqliteStore::LoadEntry(const StoredDocument& stored, const std::vector<std::string>& fields) {
   Json::Value entry = UnpackDocument(stored.row, names_, fields);
-  const bool wants_text = std::find(fields.begin(), fields.end(), field::kTextContent) != fields.end();
-  if (wants_text && stored.text_bytes > 0) entry[field::kTextContent] = texts_.Text(stored.id);
+  const auto names = [&fields](const char* name) {
+    return std::find(fields.begin(), fields.end(), name) != fields.end();
+  };
+  const bool wants_access = stored.row.access != AccessRecords::kNone && (fields.empty() || names(field::kAccess));
+  if (wants_access) entry[field::kAccess] = access_.TextOf(stored.row.access);
+  if (names(field::kTextContent) && stored.text_bytes > 0) entry[field::kTextContent] = texts_.Text(stored.id);
   return entry;
 }
 

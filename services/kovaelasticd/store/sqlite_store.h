@@ -4,6 +4,7 @@
 #include <string>
 #include <vector>
 
+#include "services/kovaelasticd/store/access_records.h"
 #include "services/kovaelasticd/store/document.h"
 #include "services/kovaelasticd/store/file_links.h"
 #include "services/kovaelasticd/store/folder_tree.h"
@@ -55,6 +56,7 @@ class SqliteStore : public IndexStore {
   void RemoveAt(const std::string& path);
   /// Keeps the sums, for a text that had `before` bytes and has `after` now.
   void CountText(int64_t before, int64_t after);
+  void CountAccess(const DocRow* before, const DocRow* after);
   void Changed(int64_t bytes);
   /// Get of documents that a list of numbers names, not a part of the tree.
   void GetListed(const GetRequest& request, const std::function<void(const Json::Value&)>& take);
@@ -66,6 +68,7 @@ class SqliteStore : public IndexStore {
   Database writer_;
   FieldNames names_;
   FolderTree tree_{writer_};
+  AccessRecords access_{writer_};
   FileLinks links_{writer_, tree_, names_};
   TextWriter texts_{writer_, names_, schema_};
   Totals totals_;                  ///< with the changes of the open transaction

@@ -35,6 +35,21 @@ void SqliteStore::CountText(int64_t before, int64_t after) {
   totals_.with_content += (after > 0 ? 1 : 0) - (before > 0 ? 1 : 0);
 }
 
+/// To be called when a row is written (`before` null: it is new) or removed (`after` null). Keeps the sum, and the
+/// record of the folder whose own document it is.
+void SqliteStore::CountAccess(const DocRow* before, const DocRow* after) {
+  const auto lacks = [](const DocRow* row) { return row != nullptr && row->access == AccessRecords::kNone ? 1 : 0; };
+  totals_.without_access += lacks(after) - lacks(before);
+  const auto give_folder = [this](const std::string& path, int64_t access) {
+    const int64_t folder = tree_.Find(path + "/");
+    if (folder != FolderTree::kNone) tree_.SetAccess(folder, access);
+  };
+  const bool was_folder = before != nullptr && before->kind == kFolder;
+  const bool is_folder = after != nullptr && after->kind == kFolder;
+  if (was_folder && !(is_folder && before->path == after->path)) give_folder(before->path, AccessRecords::kNone);
+  if (is_folder) give_folder(after->path, after->access);
+}
+
 /// To be called after each change, with the bytes of text that it changed.
 void SqliteStore::Changed(int64_t bytes) {
   uncommitted_bytes_ += bytes + kRowBytes;
@@ -42,31 +57,36 @@ void SqliteStore::Changed(int64_t bytes) {
 }
 
 int64_t SqliteStore::InsertRow(const DocRow& row, int64_t text_bytes) {
-  Statement statement = writer_.Prepare("INSERT INTO docs VALUES(?1, ?2, ?3, ?4, ?5, ?6, ?7, ?8, ?9, ?10, ?11, ?12)");
+  Statement statement =
+      writer_.Prepare("INSERT INTO docs VALUES(?1, ?2, ?3, ?4, ?5, ?6, ?7, ?8, ?9, ?10, ?11, ?12, ?13)");
   statement.BindNull(1);
   BindRow(statement, tree_.Make(FolderTree::FolderOf(row.path)), row, text_bytes);
   statement.Run();
+  const int64_t id = sqlite3_last_insert_rowid(writer_.Handle());
   ++totals_.documents;
   CountText(0, text_bytes);
-  return sqlite3_last_insert_rowid(writer_.Handle());
+  CountAccess(nullptr, &row);
+  return id;
 }
 
 void SqliteStore::UpdateRow(const StoredDocument& before, const DocRow& row, int64_t text_bytes) {
   const int64_t folder = tree_.Make(FolderTree::FolderOf(row.path));
   Statement statement = writer_.Prepare(
       "UPDATE docs SET folder = ?2, leaf = ?3, name = ?4, ext = ?5, kind = ?6, size = ?7, mtime = ?8, text_bytes = ?9,"
-      " derived = ?10, error = ?11, packed = ?12 WHERE id = ?1");
+      " derived = ?10, error = ?11, packed = ?12, access = ?13 WHERE id = ?1");
   statement.Bind(1, before.id);
   BindRow(statement, folder, row, text_bytes);
   statement.Run();
   if (folder != before.folder) tree_.Prune(before.folder);
+  CountAccess(&before.row, &row);
 }
 
 void SqliteStore::Upsert(const std::string& path, const Json::Value& document) {
   Begin();
   AddFieldNames(writer_, names_, document);
   const std::string_view text = WithoutMarks(TextOf(document));
-  const DocRow row = PackDocument(path, document, names_);
+  DocRow row = PackDocument(path, document, names_);
+  row.access = access_.NumberOf(document[field::kAccess]);
   const auto text_bytes = static_cast<int64_t>(text.size());
   const std::optional<StoredDocument> before = FindDocument(writer_, tree_, path);
   MetaText meta = MakeMetaText(row, document, *schema_);
@@ -87,6 +107,8 @@ void SqliteStore::Set(const std::string& path, const Json::Value& changes) {
   const std::optional<StoredDocument> before = FindDocument(writer_, tree_, path);
   if (!before.has_value()) throw Error(Error::kEngineNoSuchDocument, "there is no document \"" + path + "\" to change");
   Begin();
+  const int64_t access =
+      changes.isMember(field::kAccess) ? access_.NumberOf(changes[field::kAccess]) : before->row.access;
   AddFieldNames(writer_, names_, changes);
   Json::Value document = UnpackDocument(before->row, names_, {});
   for (auto member = changes.begin(); member != changes.end(); ++member) {
@@ -98,7 +120,8 @@ void SqliteStore::Set(const std::string& path, const Json::Value& changes) {
   }
   const std::string new_path = document[field::kPath].isString() ? document[field::kPath].asString() : path;
   if (new_path != path) RemoveAt(new_path);
-  const DocRow row = PackDocument(new_path, document, names_);
+  DocRow row = PackDocument(new_path, document, names_);
+  row.access = access;
   const bool text_changed = changes.isMember(field::kTextContent);
   const std::string_view text = WithoutMarks(TextOf(changes));
   const int64_t text_bytes = text_changed ? static_cast<int64_t>(text.size()) : before->text_bytes;
@@ -154,6 +177,7 @@ void SqliteStore::Remove(const StoredDocument& stored) {
   tree_.Prune(stored.folder);
   links_.OnChange(stored.id, &stored.row, nullptr);
   --totals_.documents;
+  CountAccess(&stored.row, nullptr);
   CountText(stored.text_bytes, 0);
   Changed(stored.text_bytes);
 }

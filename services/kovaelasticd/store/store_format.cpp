@@ -18,17 +18,20 @@ constexpr int64_t kApplicationId = 0x4B4F5641;  // "KOVA": what tells an index f
 /// names, which are shown in the order of a list: NOCASE.
 constexpr const char* kDocumentTables[] = {
     // FolderTree: names end with "/".
-    "CREATE TABLE folders(id INTEGER PRIMARY KEY, parent INTEGER NOT NULL, name TEXT NOT NULL)",
+    ("CREATE TABLE folders(id INTEGER PRIMARY KEY, parent INTEGER NOT NULL, name TEXT NOT NULL,"
+     " access INTEGER NOT NULL DEFAULT 0)"),
     "CREATE UNIQUE INDEX folders_place ON folders(parent, name)",
-    "INSERT INTO folders VALUES(1, 0, '/')",
+    "INSERT INTO folders(id, parent, name) VALUES(1, 0, '/')",
     // What is filtered and sorted by has a column. All other members but the text are in `packed`; of those that follow
     // from a column, `derived` only notes that the document has them.
     ("CREATE TABLE docs(id INTEGER PRIMARY KEY, folder INTEGER NOT NULL, leaf TEXT NOT NULL,"
      " name TEXT NOT NULL COLLATE NOCASE, ext TEXT NOT NULL, kind INTEGER NOT NULL, size INTEGER, mtime INTEGER,"
-     " text_bytes INTEGER NOT NULL, derived INTEGER NOT NULL, error TEXT, packed BLOB NOT NULL)"),
+     " text_bytes INTEGER NOT NULL, derived INTEGER NOT NULL, error TEXT, packed BLOB NOT NULL,"
+     " access INTEGER NOT NULL DEFAULT 0)"),
+    // Here, since folders that are made look for their own document.
+    "CREATE UNIQUE INDEX docs_place ON docs(folder, leaf)",
 };
 constexpr const char* kDocumentIndexes[] = {
-    "CREATE UNIQUE INDEX docs_place ON docs(folder, leaf)",
     "CREATE INDEX docs_name ON docs(name)",
     "CREATE INDEX docs_kind ON docs(kind, ext)",
     "CREATE INDEX docs_date ON docs(mtime)",
@@ -97,7 +100,7 @@ void UpgradeFrom2(Database& database, const Schema& schema) {
     FolderTree tree(database);
     Statement documents = database.Prepare("SELECT id, path FROM docs_2 ORDER BY path");
     Statement copy = database.Prepare(
-        "INSERT INTO docs SELECT id, ?2, ?3, name, ext, kind, size, mtime, text_bytes, derived, error, packed"
+        "INSERT INTO docs SELECT id, ?2, ?3, name, ext, kind, size, mtime, text_bytes, derived, error, packed, 0"
         " FROM docs_2 WHERE id = ?1");
     while (documents.Step()) {
       const std::string path(documents.Text(1));
@@ -113,6 +116,24 @@ void UpgradeFrom2(Database& database, const Schema& schema) {
     (void)sqlite3_exec(database.Handle(), "ROLLBACK", nullptr, nullptr, nullptr);
     throw;
   }
+}
+
+/// Files of format 3 that were made before rights were recorded lack this: a table, and a column for its numbers, which
+/// are at the end of rows so that adding them rewrites none.
+void AddAccess(Database& database) {
+  if (database.QueryInt("SELECT count(*) FROM sqlite_master WHERE name = 'access'") != 0) return;
+  database.Execute("BEGIN IMMEDIATE");
+  database.Execute(
+      "CREATE TABLE access(id INTEGER PRIMARY KEY, uid INTEGER NOT NULL, gid INTEGER NOT NULL, mode INTEGER NOT NULL,"
+      " acl TEXT NOT NULL)");
+  database.Execute("CREATE UNIQUE INDEX access_record ON access(uid, gid, mode, acl)");
+  for (const char* table : {"docs", "folders"}) {
+    const std::string has =
+        "SELECT count(*) FROM pragma_table_info('" + std::string(table) + "') WHERE name = 'access'";
+    if (database.QueryInt(has.c_str()) != 0) continue;
+    database.Execute("ALTER TABLE " + std::string(table) + " ADD COLUMN access INTEGER NOT NULL DEFAULT 0");
+  }
+  database.Execute("COMMIT");
 }
 
 /// The format, 2 or more.
@@ -146,6 +167,7 @@ void PrepareStore(Database& database, bool create, const Schema& schema) {
   RegisterFullText(database);
   if (create && database.QueryInt("SELECT count(*) FROM sqlite_master") == 0) MakeTables(database);
   if (CheckFormat(database) == 2) UpgradeFrom2(database, schema);
+  AddAccess(database);
 }
 
 }  // namespace ferrox::engine

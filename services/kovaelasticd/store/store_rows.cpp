@@ -31,6 +31,7 @@ StoredDocument ReadRow(const Statement& statement, std::string_view folder_path)
   stored.row.derived = static_cast<uint32_t>(statement.Int(9));
   stored.row.error = statement.Text(10);
   stored.row.packed = statement.Text(11);
+  stored.row.access = statement.Int(12);
   return stored;
 }
 
@@ -45,7 +46,7 @@ void BindRow(Statement& statement, int64_t folder, const DocRow& row, int64_t te
   row.mtime.has_value() ? statement.Bind(8, *row.mtime) : statement.BindNull(8);
   statement.Bind(9, text_bytes).Bind(10, int64_t{row.derived});
   row.error.empty() ? statement.BindNull(11) : statement.Bind(11, std::string_view(row.error));
-  statement.BindBlob(12, row.packed);
+  statement.BindBlob(12, row.packed).Bind(13, row.access);
 }
 
 std::optional<StoredDocument> FindDocument(Database& database, FolderTree& tree, const std::string& path) {
@@ -67,19 +68,24 @@ std::optional<StoredDocument> FindDocument(Database& database, FolderTree& tree,
 
 Totals LoadTotals(Database& database) {
   Totals totals;
+  std::optional<int64_t> without_access;
   Statement statement = database.Prepare("SELECT key, value FROM info");
   while (statement.Step()) {
     const std::string_view key = statement.Text(0);
     if (key == "documents") totals.documents = statement.Int(1);
     if (key == "with_content") totals.with_content = statement.Int(1);
     if (key == "text_bytes") totals.text_bytes = statement.Int(1);
+    if (key == "without_access") without_access = statement.Int(1);
   }
+  totals.without_access = without_access.value_or(totals.documents);  // a file from before there were records
   return totals;
 }
 
 void SaveTotals(Database& database, const Totals& totals) {
-  const std::pair<std::string_view, int64_t> values[] = {
-      {"documents", totals.documents}, {"with_content", totals.with_content}, {"text_bytes", totals.text_bytes}};
+  const std::pair<std::string_view, int64_t> values[] = {{"documents", totals.documents},
+                                                         {"with_content", totals.with_content},
+                                                         {"text_bytes", totals.text_bytes},
+                                                         {"without_access", totals.without_access}};
   Statement statement = database.Prepare("INSERT OR REPLACE INTO info(key, value) VALUES(?1, ?2)");
   for (const auto& [key, value] : values) statement.Bind(1, key).Bind(2, value).Run();
 }

@@ -26,15 +26,16 @@ struct Totals {
   int64_t documents = 0;
   int64_t with_content = 0;
   int64_t text_bytes = 0;
+  int64_t without_access = 0;  ///< documents that have no access record
 };
 
 /// Selects what ReadRow reads; a condition is to follow.
 inline constexpr char kSelectRow[] =
-    "SELECT id, folder, leaf, name, ext, kind, size, mtime, text_bytes, derived, error, packed FROM docs ";
+    "SELECT id, folder, leaf, name, ext, kind, size, mtime, text_bytes, derived, error, packed, access FROM docs ";
 /// The row at hand; `folder_path` is that of its folder.
 StoredDocument ReadRow(const Statement& statement, std::string_view folder_path);
 StoredDocument ReadRow(const Statement& statement, FolderTree& tree);
-/// Binds a row in `folder` to parameters 2 to 12, in the order of the table's columns. All that is bound must live
+/// Binds a row in `folder` to parameters 2 to 13, in the order of the table's columns. All that is bound must live
 /// until the statement has run.
 void BindRow(Statement& statement, int64_t folder, const DocRow& row, int64_t text_bytes);
 

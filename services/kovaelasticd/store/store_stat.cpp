@@ -40,6 +40,7 @@ StoreStat ReadStat(ReaderPool& readers) {
   stat.documents = totals.documents;
   stat.with_content = totals.with_content;
   stat.text_bytes = totals.text_bytes;
+  stat.without_access = totals.without_access;
   ReadFailures(*reader, stat);
   reader->database.Execute("COMMIT");
   for (const char* suffix : {"", "-wal", "-shm"}) stat.bytes_on_disk += BytesOnDisk(reader->database.Path() + suffix);
