@@ -66,6 +66,20 @@ class StoreModel {
     ASSERT_EQ(expected, listed) << "prefix " << prefix << " after " << after << " limit " << limit;
   }
 
+  /// A page of the unread documents, most times the one behind that of the last call.
+  void CheckUnread() {
+    if (random_() % 20 == 0) unread_after_ = Prefix();
+    std::vector<std::string> expected, listed;
+    for (auto it = files_.upper_bound(unread_after_); it != files_.end() && expected.size() < 2; ++it) {
+      if (it->second.is_unread) expected.push_back(it->first);
+    }
+    GetRequest request{"", "", unread_after_, 2, {"KOVAMDPath"}};
+    request.unread = true;
+    store_->Get(request, [&](const Json::Value& entry) { listed.push_back(entry["KOVAMDPath"].asString()); });
+    ASSERT_EQ(expected, listed) << "behind " << unread_after_;
+    unread_after_ = listed.size() < 2 ? "" : listed.back();
+  }
+
   /// What searches see, which is what was committed.
   void CheckSearch() {
     const std::string folder = Path();
@@ -99,6 +113,7 @@ class StoreModel {
   struct File {
     std::string access;
     bool is_folder;
+    bool is_unread;
   };
 
   void Reopen() {
@@ -121,7 +136,8 @@ class StoreModel {
   }
   void Put(const std::string& path) {
     Json::Value document = FileDocument(path, "word");
-    const File file = {Access(), random_() % 2 == 0};
+    const File file = {Access(), random_() % 2 == 0, random_() % 3 == 0};
+    if (file.is_unread) document["_KOVAExtractError"] = "not text";
     document["KOVAMDIsDir"] = file.is_folder;
     if (!file.access.empty()) document["_KOVAAccess"] = file.access;
     store_->Upsert(path, document);
@@ -157,6 +173,7 @@ class StoreModel {
   std::unique_ptr<IndexStore> store_;
   std::map<std::string, File> files_;
   std::map<std::string, File> committed_;
+  std::string unread_after_;
 };
 
 TEST(StoreModelTest, AnySequenceOfChangesLeavesTheDocumentsOfTheModel) {
@@ -166,6 +183,7 @@ TEST(StoreModelTest, AnySequenceOfChangesLeavesTheDocumentsOfTheModel) {
     for (int i = 0; i < 400; ++i) {
       model.Step();
       ASSERT_NO_FATAL_FAILURE(model.Check()) << "step " << i;
+      ASSERT_NO_FATAL_FAILURE(model.CheckUnread()) << "step " << i;
       if (i % 10 != 0) continue;
       ASSERT_NO_FATAL_FAILURE(model.CheckSearch()) << "step " << i;
       ASSERT_NO_FATAL_FAILURE(model.CheckFolders()) << "step " << i;

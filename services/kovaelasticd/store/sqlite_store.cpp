@@ -1,9 +1,6 @@
 #include "services/kovaelasticd/store/sqlite_store.h"
 
 #include <algorithm>
-#include <iterator>
-#include <limits>
-#include <map>
 
 #include "common/file_util.h"
 #include "services/kovaelasticd/store/index_files.h"
@@ -37,6 +34,10 @@ SqliteStore::SqliteStore(const std::string& path, bool create, std::shared_ptr<c
 }
 
 SqliteStore::~SqliteStore() = default;
+
+void SqliteStore::OnRow(RowWatch::Table table, int64_t number, bool is_update) {
+  listed_.OnRow(table, number, is_update);
+}
 
 void SqliteStore::Begin() {
   if (in_transaction_) return;
@@ -72,6 +73,7 @@ void SqliteStore::Rollback() {
   if (sqlite3_get_autocommit(writer_.Handle()) == 0) writer_.Execute("ROLLBACK");
   tree_.Forget();
   access_.Forget();
+  listed_.Forget();
   names_ = FieldNames();
   LoadFieldNames(writer_, names_);
   totals_ = LoadTotals(writer_);
@@ -98,31 +100,15 @@ void SqliteStore::Get(const GetRequest& request, const std::function<void(const 
     if (stored.has_value()) take(LoadEntry(*stored, request.fields));
     return;
   }
-  if (request.suspects || request.unread || request.file != 0) return GetListed(request, take);
+  if (request.suspects || request.unread || request.file != 0) {
+    for (const int64_t id : listed_.Page(request)) {
+      const std::optional<StoredDocument> stored = FindDocument(writer_, tree_, id);
+      if (stored.has_value()) take(LoadEntry(*stored, request.fields));
+    }
+    return;
+  }
   PathWalk walk(writer_, tree_, request.prefix, request.after);
   for (int64_t left = request.limit; left != 0 && walk.Next(); --left) take(LoadEntry(walk.Document(), request.fields));
-}
-
-/// Paths are composed, so the list has no order on the disk: those of the page are gathered, and their documents loaded
-/// then.
-void SqliteStore::GetListed(const GetRequest& request, const std::function<void(const Json::Value&)>& take) {
-  Statement statement = writer_.Prepare(
-      request.suspects ? "SELECT docs.id, folder, leaf FROM suspects JOIN docs ON docs.id = suspects.id"
-      : request.unread ? "SELECT id, folder, leaf FROM docs WHERE error IS NOT NULL"
-                       : "SELECT docs.id, folder, leaf FROM files JOIN docs ON docs.id = files.id WHERE file = ?1");
-  if (!request.suspects && !request.unread) statement.Bind(1, static_cast<int64_t>(request.file));
-  std::map<std::string, int64_t> page;
-  const auto page_max = request.limit < 0 ? std::numeric_limits<size_t>::max() : static_cast<size_t>(request.limit);
-  while (statement.Step()) {
-    std::string path = tree_.PathOf(statement.Int(1)) + std::string(statement.Text(2));
-    if (path <= request.after) continue;
-    page.emplace(std::move(path), statement.Int(0));
-    if (page.size() > page_max) page.erase(std::prev(page.end()));
-  }
-  for (const auto& [path, id] : page) {
-    const std::optional<StoredDocument> stored = FindDocument(writer_, tree_, id);
-    if (stored.has_value()) take(LoadEntry(*stored, request.fields));
-  }
 }
 
 void SqliteStore::RebuildSuggestions() {

@@ -9,6 +9,8 @@
 #include "services/kovaelasticd/store/file_links.h"
 #include "services/kovaelasticd/store/folder_tree.h"
 #include "services/kovaelasticd/store/index_store.h"
+#include "services/kovaelasticd/store/listed_documents.h"
+#include "services/kovaelasticd/store/row_watch.h"
 #include "services/kovaelasticd/store/sqlite_db.h"
 #include "services/kovaelasticd/store/store_reader.h"
 #include "services/kovaelasticd/store/store_rows.h"
@@ -58,8 +60,7 @@ class SqliteStore : public IndexStore {
   void CountText(int64_t before, int64_t after);
   void CountAccess(const DocRow* before, const DocRow* after);
   void Changed(int64_t bytes);
-  /// Get of documents that a list of numbers names, not a part of the tree.
-  void GetListed(const GetRequest& request, const std::function<void(const Json::Value&)>& take);
+  void OnRow(RowWatch::Table table, int64_t number, bool is_update);
   /// A document as Get returns it, with the changes that are not committed.
   Json::Value LoadEntry(const StoredDocument& stored, const std::vector<std::string>& fields);
 
@@ -70,6 +71,8 @@ class SqliteStore : public IndexStore {
   FolderTree tree_{writer_};
   AccessRecords access_{writer_};
   FileLinks links_{writer_, tree_, names_};
+  ListedDocuments listed_{writer_, tree_};
+  RowWatch watch_{writer_, [this](auto table, int64_t number, bool is_update) { OnRow(table, number, is_update); }};
   TextWriter texts_{writer_, names_, schema_};
   Totals totals_;                  ///< with the changes of the open transaction
   int64_t uncommitted_bytes_ = 0;  ///< for the automatic commit: texts, and a fixed amount for each change
