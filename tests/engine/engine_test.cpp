@@ -135,6 +135,48 @@ TEST_F(EngineTest, AFolderMovesWithAllBelowIt) {
   EXPECT_EQ(1, Total("path:/v"));
 }
 
+TEST_F(EngineTest, RightsAreSetForAllRecordsOrNone) {
+  ASSERT_EQ(0, Create("a", "a"));
+  const auto set = [this](const std::string& records) {
+    return Send("access_set", R"({"id":"a","records":)" + records + "}");
+  };
+  const auto record = [](const std::string& path, const std::string& stamp, const std::string& access) {
+    return R"({"path":")" + path + R"(","stamp":")" + stamp + R"(","access":")" + access + "\"}";
+  };
+  for (const char* path : {"/v/x", "/v/y"}) {
+    ASSERT_EQ(0, Code("document_upsert_by_id",
+                      R"({"id":"a","doc_id":")" + std::string(path) + R"(","data":{"_KOVAStamp":"1.1.1.7"}})"));
+  }
+  const std::string good = record("/v/x", "1.1.5000000000.7", "1000:100:0640:u5001=4,g=4,g200=6");
+  for (const std::string& bad :
+       {record("v/y", "1.1.2.7", "0:0:0644"), record("/v/y", "1.1.7", "0:0:0644"), record("/v/y", "1.1.2.7", ""),
+        record("/v/y", "1.1.2.7", "0:0:644"), record("/v/y", "1.1.2.7", "00:0:0644"),
+        record("/v/y", "1.1.2.7", "0:0:10644"), record("/v/y", "1.1.2.7", "0:0:0644:"),
+        record("/v/y", "1.1.2.7", "0:0:0644:u5=4"), record("/v/y", "1.1.2.7", "0:0:0644:g5=4,g=4"),
+        record("/v/y", "1.1.2.7", "0:0:0644:g=8"), record("/v/y", "1.1.2.7", "4294967296:0:0644"),
+        std::string(R"({"path":"/v/y","stamp":"1.1.2.7"})"), std::string("1")}) {
+    const Json::Value reply = set("[" + good + "," + bad + "]");
+    EXPECT_EQ(Error::kEngineBadRequest, CodeOf(reply)) << bad;
+    EXPECT_NE(reply["error"]["msg"].asString().find("position 1: "), std::string::npos) << toString(reply);
+  }
+  EXPECT_EQ(Error::kEngineBadRequest, CodeOf(set("{}")));
+  EXPECT_EQ(Error::kEngineBadRequest,
+            Code("document_set_by_id", R"({"id":"a","doc_id":"/v/x","data":{"_KOVAAccess":1}})"));
+  ASSERT_EQ(0, Commit("a"));
+  EXPECT_EQ(Send("index_stat", R"({"id":"a"})")["data"]["without_access"].asInt(), 2);
+  const Json::Value reply =
+      set("[" + record("/v", "9.9.9.9", "0:0:0755") + "," + good + "," + record("/v/y", "2.1.1.7", "0:0:0600") + "]");
+  EXPECT_EQ(toString(reply["data"]), R"({"differing":[2],"missing":[0]})");
+  ASSERT_EQ(0, Commit("a"));
+  EXPECT_EQ(Send("index_stat", R"({"id":"a"})")["data"]["without_access"].asInt(), 0);
+  EXPECT_EQ(Total("owner:1000 group:100"), 1) << "of the differing one, nothing else is set";
+  const Json::Value found = Send("search", R"({"query":"path:/v/x"})")["data"]["hits"][0]["fields"];
+  EXPECT_EQ(found["KOVAMDAttributeChangeDate"].asInt(), 5);
+  EXPECT_FALSE(found.isMember("_KOVAAccess")) << "who may read it is nobody's business";
+  const Json::Value suspects = Send("document_get_by_query", R"({"id":"a","query":{"qsl":{"suspects":true}}})")["data"];
+  EXPECT_EQ(suspects.size(), 1U) << "of the other name of the file it is not known yet";
+}
+
 TEST_F(EngineTest, IndicesPauseMoveRenameAndGo) {
   ASSERT_EQ(Create("a", "a"), 0);
   EXPECT_EQ(Create("a", "a"), 0) << "the same again";

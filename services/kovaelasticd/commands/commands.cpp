@@ -19,22 +19,10 @@ constexpr size_t kPathMaxBytes = 8192;
 constexpr int64_t kListMaxBytes = 128 << 20;
 constexpr int64_t kMaxInt = std::numeric_limits<int64_t>::max();
 
-[[noreturn]] void RefuseMember(const char* name, const std::string& must_be) {
-  throw Error(Error::kEngineBadRequest, "\"" + std::string(name) + "\" must be " + must_be);
-}
-
 std::string IndexId(const Json::Value& data) {
   const std::string id = RequiredText(data, "id");
   if (id.empty() || id.size() > kIdMaxBytes) RefuseMember("id", "an index id of 1 to 512 bytes");
   return id;
-}
-
-/// `path`, if it is one that a document or an index may have. `name` is the member that it stands in.
-std::string CheckedPath(const char* name, const std::string& path) {
-  const bool usable =
-      !path.empty() && path.front() == '/' && path.size() <= kPathMaxBytes && path.find('\0') == std::string::npos;
-  if (!usable) RefuseMember(name, "an absolute path of at most 8192 bytes");
-  return path;
 }
 
 /// An index's folder, without "/" at its end, so that one folder has one spelling.
@@ -129,7 +117,6 @@ Json::Value OnIndexStat(CommandCall& call) {
   result["bytes_on_disk"] = Json::Int64(stat.bytes_on_disk);
   result["text_bytes"] = Json::Int64(stat.text_bytes);
   result["without_access"] = Json::Int64(stat.without_access);
-  if (stat.clearing > 0) result["clearing"] = Json::Int64(stat.clearing);
   result["uncommitted"] = Json::Int64(open.index->Uncommitted());
   AddRebuilding(open.rebuild, result);
   result["extract_errors"] = Json::Value(Json::objectValue);
@@ -238,6 +225,7 @@ constexpr Command kCommands[] = {{"index_create", &OnIndexCreate, false},
                                  {kMoveFolder, &OnDocumentChange<kMoveFolder>, false},
                                  {kDelete, &OnDocumentChange<kDelete>, false},
                                  {kDeleteQuery, &OnDocumentChange<kDeleteQuery>, false},
+                                 {"access_set", &RunAccessSet, false},
                                  {"document_get_by_query", &OnGetByQuery, false},
                                  {"commit", &OnCommit, false},
                                  {"update_term_suggestion", &OnUpdateTermSuggestion, false},
@@ -308,6 +296,17 @@ void Apply(IndexStore& store, const DocumentChange& change) {
     case DocumentChange::Type::kDeletePrefix:
       return store.DeletePrefix(change.path);
   }
+}
+
+void RefuseMember(const char* name, const std::string& must_be) {
+  throw Error(Error::kEngineBadRequest, "\"" + std::string(name) + "\" must be " + must_be);
+}
+
+std::string CheckedPath(const char* name, const std::string& path) {
+  const bool usable =
+      !path.empty() && path.front() == '/' && path.size() <= kPathMaxBytes && path.find('\0') == std::string::npos;
+  if (!usable) RefuseMember(name, "an absolute path of at most 8192 bytes");
+  return path;
 }
 
 std::string RequiredText(const Json::Value& data, const char* name) {

@@ -58,6 +58,12 @@ const Json::Value& RequiredObject(const Json::Value& data, const char* name);
 int64_t OptionalInt(const Json::Value& data, const char* name, int64_t otherwise, int64_t low, int64_t high);
 bool OptionalBool(const Json::Value& data, const char* name, bool otherwise);
 
+[[noreturn]] void RefuseMember(const char* name, const std::string& must_be);
+/// `path`, if it is one that a document or an index may have. `name` is the member that it stands in.
+std::string CheckedPath(const char* name, const std::string& path);
+
+/// The command "access_set" (access_command.cpp).
+Json::Value RunAccessSet(CommandCall& call);
 /// The command "search" (search_command.cpp).
 Json::Value RunSearch(CommandCall& call);
 

@@ -120,9 +120,7 @@ int64_t AccessRecords::NumberOf(const std::string& text) {
   if (kept != numbers_.end()) return kept->second;
   const std::optional<AccessRecord> record = ParseAccess(text);
   if (!record.has_value()) {
-    throw Error(Error::kEngineBadRequest,
-                "\"" + std::string(field::kAccess) +
-                    "\" must be a text like 1000:100:0640 or 1000:100:0640:u5001=4,g=4,g200=6");
+    throw Error(Error::kEngineBadRequest, "\"" + std::string(field::kAccess) + "\" must be " + kAccessSpelling);
   }
   const std::string acl = AclText(record->acl);
   const auto bind = [&record, &acl](Statement statement) {

@@ -31,6 +31,8 @@ struct AccessRecord {
   std::vector<AclEntry> acl;  ///< in the kernel's order: users, owning group, groups; empty: the mode tells all
 };
 
+/// What a record must be, for refusals.
+inline constexpr char kAccessSpelling[] = "a text like 1000:100:0640 or 1000:100:0640:u5001=4,g=4,g200=6";
 /// Nothing when the text is no record, or not spelt as AccessText spells it.
 std::optional<AccessRecord> ParseAccess(std::string_view text);
 std::string AccessText(const AccessRecord& record);

@@ -8,8 +8,8 @@
 
 #include "base/text.h"
 #include "common/file_util.h"
-#include "common/json_util.h"
 #include "fileindex/util.h"
+#include "services/kovaelasticd/store/packed_fields.h"
 #include "services/kovaelasticd/text/words.h"
 
 namespace ferrox::engine {
@@ -18,11 +18,6 @@ namespace {
 
 /// Larger numbers are in no range.
 constexpr double kRangedMax = 1e15;
-
-// A row's packed fields: for each one its number in the table "fields" and its value. Numbers are written 7 bits at a
-// time, the lowest first, with bit 7 set on all bytes but the last; signed ones with the sign in bit 0 (zigzag), so
-// that small negative numbers are short. A value is a byte of Tag and, for texts, arrays and objects (as JSON text) and
-// floating-point numbers, length and bytes.
 
 /// A field whose value follows from a column: its name and how it follows. Its place in the table is its bit in
 /// DocRow::derived, so new ones are added at the end.
@@ -51,85 +46,6 @@ int DerivedIndex(const std::string& name) {
   }
   return -1;
 }
-
-/// The first byte of a packed value. Stored: the numbers never change.
-enum class Tag : char { kNull, kFalse, kTrue, kInt, kText, kJson };
-
-void PutNumber(std::string& out, uint64_t value) {
-  for (; value >= 0x80; value >>= 7) out += static_cast<char>(value | 0x80);
-  out += static_cast<char>(value);
-}
-
-void PutText(std::string& out, Tag tag, const std::string& text) {
-  out += static_cast<char>(tag);
-  PutNumber(out, text.size());
-  out += text;
-}
-
-void PutValue(std::string& out, const Json::Value& value) {
-  if (value.isNull()) {
-    out += static_cast<char>(Tag::kNull);
-  } else if (value.isBool()) {
-    out += static_cast<char>(value.asBool() ? Tag::kTrue : Tag::kFalse);
-  } else if (value.isInt64() && value.type() != Json::realValue) {
-    out += static_cast<char>(Tag::kInt);
-    const int64_t number = value.asInt64();
-    PutNumber(out, (static_cast<uint64_t>(number) << 1) ^ static_cast<uint64_t>(number >> 63));
-  } else if (value.isString()) {
-    PutText(out, Tag::kText, value.asString());
-  } else {
-    PutText(out, Tag::kJson, toString(value));
-  }
-}
-
-/// Reads what PutNumber, PutText and PutValue wrote. Bytes that they cannot have written end it.
-class Unpacker {
- public:
-  explicit Unpacker(std::string_view bytes) : bytes_(bytes) {}
-  bool AtEnd() const { return bytes_.empty(); }
-
-  uint64_t Number() {
-    uint64_t value = 0;
-    for (int shift = 0; !bytes_.empty() && shift < 64; shift += 7) {
-      const auto byte = static_cast<unsigned char>(bytes_.front());
-      bytes_.remove_prefix(1);
-      value |= static_cast<uint64_t>(byte & 0x7F) << shift;
-      if (byte < 0x80) break;
-    }
-    return value;
-  }
-
-  /// Reads a value; skips it when `value` is null.
-  void Value(Json::Value* value) {
-    if (bytes_.empty()) return;
-    const Tag tag = static_cast<Tag>(bytes_.front());
-    bytes_.remove_prefix(1);
-    if (tag == Tag::kInt) {
-      const uint64_t coded = Number();
-      if (value != nullptr) *value = Json::Int64(static_cast<int64_t>(coded >> 1) ^ -static_cast<int64_t>(coded & 1));
-    } else if (tag == Tag::kText || tag == Tag::kJson) {
-      const std::string_view text = Text();
-      if (value == nullptr) return;
-      if (tag == Tag::kText) {
-        *value = Json::Value(text.data(), text.data() + text.size());
-      } else {
-        (void)fromString(*value, std::string(text));
-      }
-    } else if (value != nullptr) {
-      *value = tag == Tag::kNull ? Json::Value() : Json::Value(tag == Tag::kTrue);
-    }
-  }
-
- private:
-  std::string_view Text() {
-    const size_t size = static_cast<size_t>(std::min<uint64_t>(Number(), bytes_.size()));
-    const std::string_view text = bytes_.substr(0, size);
-    bytes_.remove_prefix(size);
-    return text;
-  }
-
-  std::string_view bytes_;
-};
 
 /// A member that is a text, or else `otherwise`.
 std::string TextMember(const Json::Value& document, const char* name, const std::string& otherwise) {
@@ -239,8 +155,7 @@ DocRow PackDocument(const std::string& path, const Json::Value& document, const 
     if (derived >= 0 && kDerived[derived].value(row) == *member) {
       row.derived |= 1U << derived;
     } else {
-      PutNumber(row.packed, static_cast<uint64_t>(names.NumberOf(name)));
-      PutValue(row.packed, *member);
+      AddField(row.packed, names.NumberOf(name), *member);
     }
   }
   return row;
@@ -262,10 +177,9 @@ Json::Value UnpackDocument(const DocRow& row, const FieldNames& names, const std
       document[kDerived[i].name] = kDerived[i].value(row);
     }
   }
-  for (Unpacker unpacker(row.packed); !unpacker.AtEnd();) {
-    const std::string* name = names.NameOf(static_cast<int64_t>(unpacker.Number()));
-    const bool load = name != nullptr && IsWanted(wanted, *name);
-    unpacker.Value(load ? &document[*name] : nullptr);
+  for (PackedFields fields(row.packed); fields.Next();) {
+    const std::string* name = names.NameOf(fields.Number());
+    if (name != nullptr && IsWanted(wanted, *name)) document[*name] = fields.Value();
   }
   return document;
 }

@@ -63,13 +63,25 @@ struct SearchReply {
 /// Figures of an index; those of documents are as of its last commit.
 struct StoreStat {
   int64_t documents = 0;
-  int64_t with_content = 0;    ///< of these, those with text
-  int64_t bytes_on_disk = 0;   ///< of all its files
-  int64_t text_bytes = 0;      ///< of all texts, unpacked
-  int64_t without_access = 0;  ///< documents that have no access record
-  int64_t clearing = 0;        ///< documents that are deleted, but whose words are still to be taken out (ClearSome)
+  int64_t with_content = 0;                       ///< of these, those with text
+  int64_t bytes_on_disk = 0;                      ///< of all its files
+  int64_t text_bytes = 0;                         ///< of all texts, unpacked
+  int64_t without_access = 0;                     ///< documents that have no access record
   std::map<std::string, int64_t> extract_errors;  ///< documents for each reason why content could not be read
   std::map<std::string, std::vector<std::string>> extract_error_examples;  ///< of each reason, one or two paths
+};
+
+/// What was seen of the file at `path`.
+struct AccessChange {
+  std::string path;
+  std::string stamp;   ///< "_KOVAStamp"
+  std::string access;  ///< "_KOVAAccess"
+};
+
+/// Positions in the list that SetAccess was given.
+struct AccessReport {
+  std::vector<size_t> differing;  ///< of documents whose content is not that of the stamp
+  std::vector<size_t> missing;    ///< of paths without a document
 };
 
 /// One index: its documents, and what finds them. Changes, Get and Commit are for one thread at a time; Search and Stat
@@ -95,8 +107,12 @@ class IndexStore {
   /// Neither path may lie at or below the other.
   /// @throws Error kEngineNoSuchDocument where none is at `path`, or another; nothing is changed then.
   virtual void MoveFolder(const std::string& path, const std::string& stamp, const Json::Value& changes) = 0;
+  /// Sets the rights of documents, as Set would set "_KOVAAccess" and the members that change with it: stamp, owner,
+  /// group, date of the change. Of a document whose content differs from what was seen only the access record is set,
+  /// and where there is none, that of a folder at the path. Stamps and records must be well-formed. Cheap, unless owner
+  /// or group change: they are searched for.
+  virtual AccessReport SetAccess(const std::vector<AccessChange>& changes) = 0;
   virtual void Delete(const std::string& path) = 0;
-  /// Large folders cost no more than a look at the rows of their documents. Their words are left to ClearSome.
   virtual void DeletePrefix(const std::string& prefix) = 0;
   /// Lists documents, uncommitted ones too.
   virtual void Get(const GetRequest& request, const std::function<void(const Json::Value&)>& take) = 0;
@@ -106,14 +122,7 @@ class IndexStore {
   virtual void Rollback() = 0;
   /// How much has been changed since the last commit, in bytes of text, roughly.
   virtual int64_t UncommittedBytes() const = 0;
-  /// How many documents are deleted, uncommitted deletions too, but still to be cleared.
-  virtual int64_t Uncleared() const = 0;
-  /// Takes the words of some of them out, as a transaction of its own of some 50 ms, and commits it. No changes may be
-  /// uncommitted. To be called until Uncleared is 0; what is left at the end of the process is there when the index is
-  /// opened again.
-  virtual void ClearSome() = 0;
-  /// Rebuilds the words that are suggested when a search finds nothing; ClearSome does it at its end while documents
-  /// are to be cleared.
+  /// Rebuilds the words that are suggested when a search finds nothing.
   virtual void RebuildSuggestions() = 0;
 
   virtual SearchReply Search(const SearchRequest& request) = 0;

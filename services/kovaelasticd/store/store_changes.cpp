@@ -35,21 +35,6 @@ void SqliteStore::CountText(int64_t before, int64_t after) {
   totals_.with_content += (after > 0 ? 1 : 0) - (before > 0 ? 1 : 0);
 }
 
-/// To be called when a row is written (`before` null: it is new) or removed (`after` null). Keeps the sum, and the
-/// record of the folder whose own document it is.
-void SqliteStore::CountAccess(const DocRow* before, const DocRow* after) {
-  const auto lacks = [](const DocRow* row) { return row != nullptr && row->access == AccessRecords::kNone ? 1 : 0; };
-  totals_.without_access += lacks(after) - lacks(before);
-  const auto give_folder = [this](const std::string& path, int64_t access) {
-    const int64_t folder = tree_.Find(path + "/");
-    if (folder != FolderTree::kNone) tree_.SetAccess(folder, access);
-  };
-  const bool was_folder = before != nullptr && before->kind == kFolder;
-  const bool is_folder = after != nullptr && after->kind == kFolder;
-  if (was_folder && !(is_folder && before->path == after->path)) give_folder(before->path, AccessRecords::kNone);
-  if (is_folder) give_folder(after->path, after->access);
-}
-
 /// To be called after each change, with the bytes of text that it changed.
 void SqliteStore::Changed(int64_t bytes) {
   uncommitted_bytes_ += bytes + kRowBytes;
@@ -59,10 +44,10 @@ void SqliteStore::Changed(int64_t bytes) {
 int64_t SqliteStore::InsertRow(const DocRow& row, int64_t text_bytes) {
   Statement statement =
       writer_.Prepare("INSERT INTO docs VALUES(?1, ?2, ?3, ?4, ?5, ?6, ?7, ?8, ?9, ?10, ?11, ?12, ?13)");
-  const int64_t id = next_id_++;
-  statement.Bind(1, id);
+  statement.BindNull(1);
   BindRow(statement, tree_.Make(FolderTree::FolderOf(row.path)), row, text_bytes);
   statement.Run();
+  const int64_t id = sqlite3_last_insert_rowid(writer_.Handle());
   ++totals_.documents;
   CountText(0, text_bytes);
   CountAccess(nullptr, &row);
@@ -189,19 +174,6 @@ void SqliteStore::Delete(const std::string& path) {
 
 void SqliteStore::DeletePrefix(const std::string& prefix) {
   Begin();
-  const int64_t folder = tree_.Find(FolderTree::FolderOf(prefix));
-  if (folder == FolderTree::kNone) return;
-  const std::string begin(FolderTree::LeafOf(prefix));
-  const bool whole = begin.empty() && folder != FolderTree::kTop;
-  for (const int64_t each : whole ? std::vector<int64_t>{folder} : tree_.ChildrenOf(folder, begin)) {
-    if (!clearing_.IsLarge(each)) continue;
-    clearing_.TakeOut(each);
-    Changed(0);
-  }
-  RemoveOneByOne(prefix);
-}
-
-void SqliteStore::RemoveOneByOne(const std::string& prefix) {
   std::vector<StoredDocument> found;
   do {
     found.clear();
