@@ -1,8 +1,8 @@
 // What the search engine costs: generated text (words drawn by Zipf's law from 60,000, seed fixed) in 20,000 documents
 // of 0.5 to 60 KB unless told otherwise, sent as requests to the engine inside this process, without a socket. Measured
-// are building, the size of the index, one change with its commit, a folder's rename, its deletion, and 50 ranked
-// queries, 20 hits with snippets each.
-//   engine_bench [--documents N] [--folder DIR]
+// are building, the size of the index, one change with its commit, 50 ranked queries, 20 hits with snippets each, the
+// rename of a folder with a quarter of the documents, and its deletion, beside that of as many documents one by one.
+//   engine_bench [--documents N] [--text BYTES] [--folder DIR]      BYTES: the size of each text
 #include <sys/resource.h>
 
 #include <algorithm>
@@ -15,6 +15,7 @@
 #include <functional>
 #include <random>
 #include <string>
+#include <thread>
 #include <vector>
 
 #include <json/value.h>
@@ -84,7 +85,9 @@ class TextSource {
 
 class Bench {
  public:
-  Bench(const std::string& folder, size_t documents) : folder_(folder), documents_(documents), engine_(folder) {}
+  /// `text_bytes`, unless 0, is the size of each text.
+  Bench(const std::string& folder, size_t documents, size_t text_bytes)
+      : folder_(folder), documents_(documents), text_bytes_(text_bytes), engine_(folder) {}
 
   void Run() {
     Call("index_create", [this](Json::Value& data) { data["path"] = folder_ + "/index"; });
@@ -146,7 +149,8 @@ class Bench {
     double generating = 0;
     for (size_t number = 0; number < documents_; ++number) {
       const double before = CpuSec();
-      const double size = 512 * std::exp(std::uniform_real_distribution<double>(0, 4.77)(random_));
+      const double drawn = 512 * std::exp(std::uniform_real_distribution<double>(0, 4.77)(random_));
+      const double size = text_bytes_ > 0 ? static_cast<double>(text_bytes_) : drawn;
       const std::string text = source_.Text(random_, static_cast<size_t>(size));
       if (number % 1000 == 0) samples_.push_back(text);
       text_bytes += static_cast<double>(text.size());
@@ -207,8 +211,11 @@ class Bench {
     }
   }
 
+  /// How many documents are renamed, and deleted.
+  size_t MovedCount() const { return documents_ / 4; }
+
   void MeasureRename() {
-    const size_t count = std::min<size_t>(documents_, 10000);
+    const size_t count = MovedCount();
     Json::Value request;
     Json::Value& parts = request["compound"] = Json::Value(Json::arrayValue);
     for (size_t number = 0; number < count; ++number) {
@@ -253,17 +260,38 @@ class Bench {
     }
   }
 
+  /// As many documents one by one, and then the folder of the others.
   void MeasureDelete() {
-    const double cpu = CpuSec();
-    const auto began = SteadyClock::now();
+    Json::Value request;
+    for (size_t number = MovedCount(); number < 2 * MovedCount(); ++number) {
+      Json::Value part;
+      part["command"] = "document_del_by_id";
+      part["data"]["id"] = kId;
+      part["data"]["doc_id"] = PathOf(number);
+      request["compound"].append(part);
+    }
+    double cpu = CpuSec();
+    auto began = SteadyClock::now();
+    (void)Send(request);
+    Call("commit");
+    printf("delete %-6zu by one   %.2f s, %.2f s of CPU\n", MovedCount(), WallSec(began), CpuSec() - cpu);
+
+    cpu = CpuSec();
+    began = SteadyClock::now();
     Call("document_del_by_query",
          [](Json::Value& data) { data["query"]["qsl"]["prefix"]["KOVAMDPath"] = "/volume1/moved/"; });
     Call("commit");
-    printf("delete those           %.2f s, %.2f s of CPU\n", WallSec(began), CpuSec() - cpu);
+    const double total =
+        Call("search", [](Json::Value& data) { data["query"] = "path:/volume1/moved"; })["total"].asDouble();
+    printf("delete of their folder %.3f s until %.0f of them are found, %.2f s of CPU\n", WallSec(began), total,
+           CpuSec() - cpu);
+    while (Call("index_stat")["clearing"].asInt64() > 0) std::this_thread::sleep_for(std::chrono::milliseconds(50));
+    printf("  and cleared          %.2f s, %.2f s of CPU\n", WallSec(began), CpuSec() - cpu);
   }
 
   std::string folder_;
   size_t documents_;
+  size_t text_bytes_;
   ferrox::engine::Engine engine_;
   TextSource source_;
   std::mt19937_64 random_{20240607};
@@ -274,14 +302,16 @@ class Bench {
 
 int main(int argc, char** argv) {
   size_t documents = 20000;
+  size_t text_bytes = 0;
   std::string folder;
   for (int i = 1; i + 1 < argc; i += 2) {
     if (strcmp(argv[i], "--documents") == 0) documents = strtoul(argv[i + 1], nullptr, 10);
+    if (strcmp(argv[i], "--text") == 0) text_bytes = strtoul(argv[i + 1], nullptr, 10);
     if (strcmp(argv[i], "--folder") == 0) folder = argv[i + 1];
   }
   std::string pattern = (folder.empty() ? std::filesystem::temp_directory_path().string() : folder) + "/engine-XXXXXX";
   if (mkdtemp(pattern.data()) == nullptr) return 1;
-  Bench(pattern, documents).Run();
+  Bench(pattern, documents, text_bytes).Run();
   std::filesystem::remove_all(pattern);
   return 0;
 }

@@ -16,7 +16,9 @@ class IndexStoreTest : public testing::Test {
   IndexStoreTest() { Reopen(); }
   void Reopen() {
     store_.reset();
-    store_ = std::make_unique<SqliteStore>(folder_ / "index.sqlite", true, PlainSchema());
+    auto store = std::make_unique<SqliteStore>(folder_ / "index.sqlite", true, PlainSchema());
+    store->LimitClearing({2, 1, 1});
+    store_ = std::move(store);
   }
   void Put(const Json::Value& document) { store_->Upsert(document["KOVAMDPath"].asString(), document); }
   void Put(const std::string& path, const std::string& text) { Put(FileDocument(path, text)); }
@@ -85,6 +87,49 @@ TEST_F(IndexStoreTest, OtherNamesOfAChangedFileAreSuspects) {
   store_->Delete("/b");
   Put(stamped("/new", "1.1.1.77"));
   EXPECT_EQ("", suspects());
+}
+
+TEST_F(IndexStoreTest, OfADeletedFolderNothingIsSeenFromTheCommitOn) {
+  const auto put = [this](const std::string& path, const std::string& stamp) {
+    Json::Value document = FileDocument(path, "harbour boats");
+    document["_KOVAStamp"] = stamp;
+    document["_KOVAExtractError"] = "not text";
+    Put(document);
+  };
+  put("/live", "1.1.1.77");
+  put("/gone/1", "1.1.1.77");
+  put("/gone/2", "1.1.1.78");
+  put("/gone/below/3", "1.1.1.79");
+  store_->Commit();
+  store_->DeletePrefix("/gone/");
+  EXPECT_EQ(4, Find(*store_, "harbour").total) << "not committed";
+  put("/gone/2", "1.1.1.78");
+  store_->Commit();
+  for (bool cleared = false; !cleared; store_->ClearSome()) {
+    cleared = store_->Uncleared() == 0;
+    SCOPED_TRACE(store_->Uncleared());
+    for (const char* query : {"harbour", "boats path:/", "size:13", "-other"}) {
+      EXPECT_EQ("/gone/2\n/live", FindPaths(*store_, query)) << query;
+    }
+    const StoreStat stat = store_->Stat();
+    EXPECT_EQ(2, stat.documents);
+    EXPECT_EQ(store_->Uncleared(), stat.clearing);
+    EXPECT_EQ(2, stat.extract_errors.at("not text"));
+    EXPECT_EQ((std::vector<std::string>{"/live", "/gone/2"}), stat.extract_error_examples.at("not text"));
+    GetRequest listed;
+    listed.unread = true;
+    EXPECT_EQ("/gone/2|/live|", List(listed));
+    listed = {};
+    listed.file = 79;
+    EXPECT_EQ("", List(listed));
+    listed = {};
+    listed.suspects = true;
+    EXPECT_EQ("/live|", List(listed));
+    store_->RebuildSuggestions();
+    store_->Commit();
+    if (store_->Uncleared() == 1) Reopen();
+  }
+  EXPECT_EQ(std::vector<std::string>{"boats"}, Find(*store_, "baots").suggestions);
 }
 
 TEST_F(IndexStoreTest, DocumentsAreFoundByAllTheirParts) {

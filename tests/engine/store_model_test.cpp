@@ -12,6 +12,7 @@
 
 #include "base/path.h"
 #include "services/kovaelasticd/store/access_records.h"
+#include "services/kovaelasticd/store/fts.h"
 #include "tests/engine/store_helpers.h"
 #include "tests/support/temp_dir.h"
 
@@ -33,7 +34,7 @@ class StoreModel {
   }
 
   void Step() {
-    switch (random_() % 12) {
+    switch (random_() % 14) {
       case 0:
         return Move(Path(), Path());
       case 1:
@@ -52,6 +53,12 @@ class StoreModel {
         return;
       case 5:
         return SetAccess();
+      case 6:
+        store_->Commit();
+        committed_ = files_;
+        committed_folders_ = folders_;
+        for (auto turns = random_() % 4; turns > 0; --turns) store_->ClearSome();
+        return;
       default:
         return Put(Path());
     }
@@ -98,6 +105,11 @@ class StoreModel {
     for (const auto& [path, file] : committed_) expected += base::IsAtOrBelow(path, folder) ? 1 : 0;
     ASSERT_EQ(expected, Find(*store_, "path:\"" + folder + "\"").total) << folder;
     ASSERT_EQ(std::ssize(committed_), store_->Stat().documents);
+    for (const char* query : {"word", "-other", "kind:other word OR size:4"}) {
+      const SearchReply reply = Find(*store_, query, {nullptr, 0, 1000});
+      ASSERT_EQ(std::ssize(committed_), reply.total) << query;
+      for (const SearchHit& hit : reply.hits) ASSERT_TRUE(committed_.contains(hit.path)) << hit.path;
+    }
     const auto lacks = [](const auto& entry) { return entry.second.access.empty(); };
     ASSERT_EQ(std::count_if(committed_.begin(), committed_.end(), lacks), store_->Stat().without_access);
     const auto owned = [](const auto& entry) { return entry.second.owner == "1000"; };
@@ -126,6 +138,20 @@ class StoreModel {
     }
   }
 
+  /// What is left in the file once all is cleared, beside that of an index of the same documents.
+  void CheckWords() {
+    store_->Commit();
+    while (store_->Uncleared() > 0) store_->ClearSome();
+    SqliteStore fresh(folder_ / "fresh.sqlite", true, std::make_shared<Schema>(mappings_));
+    store_->Get({"", "/", "", -1, {}}, [&fresh](Json::Value entry) {
+      entry["KOVAMDTextContent"] = "word";
+      fresh.Upsert(entry["KOVAMDPath"].asString(), entry);
+    });
+    fresh.Commit();
+    store_.reset();
+    EXPECT_EQ(ContentOf(folder_ / "fresh.sqlite"), ContentOf(folder_ / "index.sqlite"));
+  }
+
  private:
   struct File {
     std::string access;
@@ -144,7 +170,24 @@ class StoreModel {
 
   void Reopen() {
     store_.reset();
-    store_ = std::make_unique<SqliteStore>(folder_ / "index.sqlite", true, std::make_shared<Schema>(mappings_));
+    auto store = std::make_unique<SqliteStore>(folder_ / "index.sqlite", true, std::make_shared<Schema>(mappings_));
+    store->LimitClearing({2, 3, 1 << 20});
+    store_ = std::move(store);
+  }
+  /// The words, each with the number of documents that have it, and how many rows the tables have.
+  static std::string ContentOf(const std::string& path) {
+    Database database(path, Database::Mode::kRead);
+    RegisterFullText(database);
+    std::string content;
+    for (const std::string table : {"content", "meta"}) {
+      database.Execute("CREATE VIRTUAL TABLE temp." + table + " USING fts5vocab('main', '" + table + "_fts', 'row')");
+      Statement words = database.Prepare("SELECT term || ' ' || doc FROM temp." + table);
+      while (words.Step()) content += std::string(words.Text(0)) + "\n";
+    }
+    for (const std::string table : {"docs", "folders", "bodies", "files", "suspects"}) {
+      content += table + " " + std::to_string(database.QueryInt(("SELECT count(*) FROM " + table).c_str())) + "\n";
+    }
+    return content;
   }
   std::string Path() {
     static const char* const kNames[] = {"a", "a-b", "a0", "b", "\xFF", "\xC3\xA9", "", "A"};
@@ -271,6 +314,7 @@ TEST(StoreModelTest, AnySequenceOfChangesLeavesTheDocumentsOfTheModel) {
       ASSERT_NO_FATAL_FAILURE(model.CheckSearch()) << "step " << i;
       ASSERT_NO_FATAL_FAILURE(model.CheckFolders()) << "step " << i;
     }
+    model.CheckWords();
   }
 }
 

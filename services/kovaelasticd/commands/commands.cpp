@@ -117,6 +117,7 @@ Json::Value OnIndexStat(CommandCall& call) {
   result["bytes_on_disk"] = Json::Int64(stat.bytes_on_disk);
   result["text_bytes"] = Json::Int64(stat.text_bytes);
   result["without_access"] = Json::Int64(stat.without_access);
+  if (stat.clearing > 0) result["clearing"] = Json::Int64(stat.clearing);
   result["uncommitted"] = Json::Int64(open.index->Uncommitted());
   AddRebuilding(open.rebuild, result);
   result["extract_errors"] = Json::Value(Json::objectValue);

@@ -14,6 +14,10 @@ namespace {
 
 using SteadyClock = std::chrono::steady_clock;
 
+/// Between two turns of clearing, at the latest, and after one that failed.
+constexpr std::chrono::milliseconds kClearLatest{250};
+constexpr std::chrono::seconds kClearAgain{60};
+
 constexpr char kLostText[] =
     "changes since the last commit were lost, because the engine was killed or its disk was full; send them again";
 
@@ -86,9 +90,11 @@ void Index::Close() {
   store_.reset();
 }
 
-/// When the thread has something to do without a task: an automatic commit, or else a turn of the scrubber.
+/// When the thread has something to do without a task: an automatic commit, or else a turn of clearing, or of the
+/// scrubber.
 std::optional<SteadyClock::time_point> Index::NextOwnWork() const {
   if (uncommitted_ > 0) return auto_commit_at_;
+  if (store_->Uncleared() > 0) return clear_at_;
   return scrubber_ == nullptr ? std::nullopt : std::optional(scrubber_->NextTurn());
 }
 
@@ -134,7 +140,12 @@ void Index::ThreadMain() {
                      (stop || SteadyClock::now() >= auto_commit_at_ || store_->UncommittedBytes() >= kAutoCommitBytes);
     if (due) CommitByItself();
     if (stop) return;
-    if (tasks.empty() && uncommitted_ == 0 && scrubber_ != nullptr) Scrub();
+    if (uncommitted_ > 0) continue;
+    if (store_->Uncleared() > 0) {
+      Clear(!tasks.empty());
+    } else if (tasks.empty() && scrubber_ != nullptr) {
+      Scrub();
+    }
   }
 }
 
@@ -204,6 +215,19 @@ void Index::CommitByItself() {
     if (!lost_) Unmark();
   } catch (const std::exception&) {
     // Logged where it arose; the next commit that somebody asks for fails.
+  }
+}
+
+/// While tasks come all the time, a turn is done after kClearLatest all the same.
+void Index::Clear(bool busy) {
+  const SteadyClock::time_point now = SteadyClock::now();
+  if (now < clear_at_ || (busy && now < clear_at_ + kClearLatest)) return;
+  try {
+    ReportingDamage([&] { store_->ClearSome(); });
+    clear_at_ = SteadyClock::now();
+  } catch (const std::exception&) {
+    LoseChanges();  // logged where it arose
+    clear_at_ = SteadyClock::now() + kClearAgain;
   }
 }
 

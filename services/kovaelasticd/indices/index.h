@@ -21,7 +21,8 @@ namespace ferrox::engine {
 /// Changes of several callers share a transaction; a commit that several wait for is made once. What nobody commits is
 /// committed after a while, or after kAutoCommitBytes. When changes that were answered with success are lost (a full
 /// disk, or a process that died: a marker file beside the index tells), the next commit fails, so that the sender
-/// of the changes sends them again. While the thread has nothing else to do, it has the scrubber look after the file.
+/// of the changes sends them again. While the thread has nothing else to do, it clears what is left of deleted folders,
+/// and has the scrubber look after the file.
 class Index {
  public:
   static constexpr std::chrono::milliseconds kAutoCommitAfter{5000};
@@ -76,6 +77,7 @@ class Index {
   void CommitFor(const std::deque<Task*>& waiting);
   void CommitByItself();
   void CommitStore();
+  void Clear(bool busy);
   void Scrub();
   void LoseChanges();
   void Mark();
@@ -103,6 +105,7 @@ class Index {
   bool marked_ = false;  ///< the marker file is there
   bool lost_ = false;    ///< changes that were answered with success are gone, and no commit has failed for it yet
   std::chrono::steady_clock::time_point auto_commit_at_;  ///< while uncommitted_ is above 0
+  std::chrono::steady_clock::time_point clear_at_;        ///< while documents are to be cleared
 
   std::thread thread_;
 };

@@ -112,6 +112,7 @@ DocSet QueryEvaluator::AllDocuments() {
   DocSet found;
   Statement statement = database_.Prepare("SELECT id FROM docs");
   while (statement.Step()) found.Add(statement.Int(0));
+  if (hidden_ != nullptr) found.Subtract(*hidden_);
   return found;
 }
 
@@ -146,6 +147,7 @@ DocSet QueryEvaluator::EvaluateFilter(const QueryNode& node) {
                                                              : "SELECT id FROM docs WHERE mtime BETWEEN ?1 AND ?2");
     collect(statement.Bind(1, node.low).Bind(2, node.high));
   }
+  if (hidden_ != nullptr) found.Subtract(*hidden_);
   return found;
 }
 
@@ -253,8 +255,8 @@ void QueryEvaluator::CollectWords(const QueryNode& node, HitCollector& content, 
 
 /// The documents with these words; with `ranking` also their hits, what they weigh, and what snippets mark.
 DocSet QueryEvaluator::EvaluateWords(const QueryNode& node, bool ranking) {
-  HitCollector content(hits_max_);
-  HitCollector meta(hits_max_);
+  HitCollector content(hits_max_, hidden_);
+  HitCollector meta(hits_max_, hidden_);
   CollectWords(node, content, meta);
   DocSet found = content.TakeSet();
   found.UniteWith(meta.Set());

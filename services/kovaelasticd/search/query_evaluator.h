@@ -32,9 +32,9 @@ struct FoundWords {
 class QueryEvaluator {
  public:
   /// `documents`: how many the index has. `hits_max`: of how many documents, those added last, each word's hits are
-  /// kept for ranking; the sets are complete in any case.
-  QueryEvaluator(Database& database, FolderTree& tree, int64_t documents, size_t hits_max)
-      : database_(database), tree_(tree), documents_(documents), hits_max_(hits_max) {}
+  /// kept for ranking; the sets are complete in any case. `hidden`, which may be null, are never found.
+  QueryEvaluator(Database& database, FolderTree& tree, int64_t documents, size_t hits_max, const DocSet* hidden)
+      : database_(database), tree_(tree), documents_(documents), hits_max_(hits_max), hidden_(hidden) {}
 
   /// @throws Error kEngineStorage.
   DocSet Evaluate(const QueryNode& query) { return Evaluate(query, true); }
@@ -57,6 +57,7 @@ class QueryEvaluator {
   FolderTree& tree_;
   const int64_t documents_;
   const size_t hits_max_;
+  const DocSet* const hidden_;
   FoundWords found_words_;
 };
 

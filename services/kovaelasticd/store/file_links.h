@@ -4,6 +4,7 @@
 #include <functional>
 #include <string>
 
+#include "services/kovaelasticd/store/doc_set.h"
 #include "services/kovaelasticd/store/document.h"
 #include "services/kovaelasticd/store/folder_tree.h"
 #include "services/kovaelasticd/store/sqlite_db.h"
@@ -29,12 +30,17 @@ class FileLinks {
   void OnChange(int64_t id, const DocRow* before, const DocRow* after);
   /// The file of the document has another stamp, but is still the same.
   void OnSeen(int64_t id, const std::string& stamp);
+  /// Documents are to be cleared: the others of their files are noted as suspects. Costs a walk over all files.
+  void OnTakenOut(const DocSet& documents);
+  /// A document that was taken out is removed.
+  void Forget(int64_t id, const DocRow& row);
 
  private:
   /// "" for a folder, a missing row and a row without stamp.
   std::string StampOf(const DocRow* row) const;
   /// Notes the other documents of `file` as suspects, apart from those that have the same stamp.
   void MarkOthers(int64_t file, int64_t id, const std::string& stamp);
+  void Remove(int64_t file, int64_t id);
 
   Database& database_;
   FolderTree& tree_;

@@ -1,5 +1,6 @@
 #include "services/kovaelasticd/store/folder_tree.h"
 
+#include "services/kovaelasticd/store/store_rows.h"
 #include "services/kovaelasticd/text/schema.h"
 
 namespace ferrox::engine {
@@ -67,12 +68,32 @@ std::string FolderTree::PathOf(int64_t folder) {
   constexpr size_t kPathMaxBytes = 1 << 16;  // longer than any path; only a damaged file has a circle
   std::string reversed;
   while (folder != kTop) {
+    if (folder == kGone) return "";
     const Node node = NodeOf(folder);
     reversed.append(node.name.rbegin(), node.name.rend());
     if (reversed.size() > kPathMaxBytes) database_.Fail(SQLITE_CORRUPT);
     folder = node.parent;
   }
   return "/" + std::string(reversed.rbegin(), reversed.rend());
+}
+
+std::vector<int64_t> FolderTree::AtAndBelow(int64_t folder) {
+  std::vector<int64_t> folders = {folder};
+  Statement below = database_.Prepare("SELECT id FROM folders WHERE parent = ?1");
+  for (size_t i = 0; i < folders.size(); ++i) {
+    for (below.Bind(1, folders[i]); below.Step();) folders.push_back(below.Int(0));
+    below.Reset();
+  }
+  return folders;
+}
+
+std::vector<int64_t> FolderTree::ChildrenOf(int64_t folder, const std::string& begin) {
+  std::vector<int64_t> children;
+  Statement statement = database_.Prepare("SELECT id FROM folders WHERE parent = ?1 AND name >= ?2 AND name < ?3");
+  const std::string end = EndOfPrefix(begin);
+  BindEnd(statement.Bind(1, folder).Bind(2, std::string_view(begin)), 3, end);
+  while (statement.Step()) children.push_back(statement.Int(0));
+  return children;
 }
 
 void FolderTree::Move(int64_t folder, std::string_view new_path) {
@@ -97,6 +118,27 @@ void FolderTree::SetAccess(int64_t folder, int64_t access) {
   Keep(folder, std::move(node));
 }
 
+void FolderTree::TakeOut(int64_t folder, std::string_view gone_name) {
+  const int64_t parent = NodeOf(folder).parent;
+  Statement statement = database_.Prepare("UPDATE folders SET parent = ?2, name = ?3 WHERE id = ?1");
+  statement.Bind(1, folder).Bind(2, kGone).Bind(3, gone_name).Run();
+  Drop(folder);
+  Prune(parent);
+}
+
+std::vector<int64_t> FolderTree::GoneAfter(Database& database, const std::string& gone_name) {
+  std::vector<int64_t> folders;
+  Statement statement = database.Prepare("SELECT id FROM folders WHERE parent = ?1 AND name > ?2 ORDER BY name");
+  statement.Bind(1, kGone).Bind(2, std::string_view(gone_name));
+  while (statement.Step()) folders.push_back(statement.Int(0));
+  return folders;
+}
+
+std::string FolderTree::NewestGone(Database& database) {
+  Statement statement = database.Prepare("SELECT name FROM folders WHERE parent = ?1 ORDER BY name DESC LIMIT 1");
+  return statement.Bind(1, kGone).Step() ? std::string(statement.Text(0)) : "";
+}
+
 bool FolderTree::IsEmpty(int64_t folder) {
   Statement document = database_.Prepare("SELECT 1 FROM docs WHERE folder = ?1 LIMIT 1");
   if (document.Bind(1, folder).Step()) return false;
@@ -106,12 +148,19 @@ bool FolderTree::IsEmpty(int64_t folder) {
 
 void FolderTree::Prune(int64_t folder) {
   while (folder != kTop && IsEmpty(folder)) {
-    Node node = NodeOf(folder);
+    const int64_t parent = NodeOf(folder).parent;
     database_.Prepare("DELETE FROM folders WHERE id = ?1").Bind(1, folder).Run();
-    nodes_.erase(folder);
-    children_.erase({node.parent, std::move(node.name)});
-    folder = node.parent;
+    Drop(folder);
+    folder = parent;
   }
+}
+
+/// Of what was kept, what concerns one folder.
+void FolderTree::Drop(int64_t folder) {
+  const auto kept = nodes_.find(folder);
+  if (kept == nodes_.end()) return;
+  children_.erase({kept->second.parent, std::move(kept->second.name)});
+  nodes_.erase(kept);
 }
 
 void FolderTree::Keep(int64_t folder, Node node) {

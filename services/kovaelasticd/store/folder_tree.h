@@ -7,6 +7,7 @@
 #include <string_view>
 #include <unordered_map>
 #include <utility>
+#include <vector>
 
 #include "services/kovaelasticd/store/sqlite_db.h"
 
@@ -25,7 +26,8 @@ namespace ferrox::engine {
 class FolderTree {
  public:
   static constexpr int64_t kNone = 0;
-  static constexpr int64_t kTop = 1;  ///< the folder "/"
+  static constexpr int64_t kTop = 1;    ///< the folder "/"
+  static constexpr int64_t kGone = -1;  ///< what folders that were taken out have above them
 
   /// `database` must outlive this.
   explicit FolderTree(Database& database) : database_(database) {}
@@ -38,8 +40,12 @@ class FolderTree {
   int64_t Find(std::string_view folder_path);
   /// The same; makes it, and those missing above it.
   int64_t Make(std::string_view folder_path);
-  /// With "/" at its end.
+  /// With "/" at its end; "" for a folder that was taken out, or is below such a one.
   std::string PathOf(int64_t folder);
+  /// The folder and all below it, each before those in it.
+  std::vector<int64_t> AtAndBelow(int64_t folder);
+  /// The folders in `folder` whose names begin with `begin`; all for "".
+  std::vector<int64_t> ChildrenOf(int64_t folder, const std::string& begin);
   /// Gives a folder, with all below it, the path `new_path`, which no folder has and which does not lie below it.
   /// Prunes where it was.
   void Move(int64_t folder, std::string_view new_path);
@@ -47,6 +53,13 @@ class FolderTree {
   /// whoever changes that document sees to; a folder that is made or moved takes it over by itself.
   int64_t AccessOf(int64_t folder) { return NodeOf(folder).access; }
   void SetAccess(int64_t folder, int64_t access);
+  /// Takes a folder with all below it out of the tree: it has no path any more, and what it is named is free. Among
+  /// those that were taken out its name is `gone_name`, which none may have.
+  void TakeOut(int64_t folder, std::string_view gone_name);
+  /// The folders that were taken out and have a name behind `gone_name`, in the order of their names.
+  static std::vector<int64_t> GoneAfter(Database& database, const std::string& gone_name);
+  /// The last name among these; "" when there are none.
+  static std::string NewestGone(Database& database);
   /// Removes the folder if nothing is in it, and then those above it for which that holds.
   void Prune(int64_t folder);
   /// Drops what was kept.
@@ -68,6 +81,7 @@ class FolderTree {
   template <typename Next>
   int64_t Descend(std::string_view folder_path, Next next);
   void Keep(int64_t folder, Node node);
+  void Drop(int64_t folder);
   bool IsEmpty(int64_t folder);
 
   Database& database_;

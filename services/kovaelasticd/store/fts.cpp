@@ -169,6 +169,7 @@ fts5_api* FullTextApi(Database& database) {
 }  // namespace
 
 void HitCollector::Add(int64_t id, uint8_t count, uint8_t places) {
+  if (hidden_ != nullptr && hidden_->Contains(id)) return;
   set_.Add(id);
   if (hits_.size() >= 2 * hits_max_) hits_.erase(hits_.begin(), hits_.end() - static_cast<ptrdiff_t>(hits_max_));
   hits_.push_back({static_cast<uint32_t>(id), count, places});

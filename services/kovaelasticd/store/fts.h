@@ -27,7 +27,8 @@ constexpr uint8_t kCountMax = 32;
 /// index last one by one, with their counts.
 class HitCollector {
  public:
-  explicit HitCollector(size_t hits_max) : hits_max_(hits_max) {}
+  /// `hidden`, which may be null, are documents to pass over.
+  explicit HitCollector(size_t hits_max, const DocSet* hidden = nullptr) : hits_max_(hits_max), hidden_(hidden) {}
   /// Documents come in ascending order, phrase by phrase.
   void Add(int64_t id, uint8_t count, uint8_t places);
   const DocSet& Set() const { return set_; }
@@ -37,6 +38,7 @@ class HitCollector {
 
  private:
   size_t hits_max_;
+  const DocSet* hidden_;
   DocSet set_;
   std::vector<WordHit> hits_;
 };

@@ -63,10 +63,11 @@ struct SearchReply {
 /// Figures of an index; those of documents are as of its last commit.
 struct StoreStat {
   int64_t documents = 0;
-  int64_t with_content = 0;                       ///< of these, those with text
-  int64_t bytes_on_disk = 0;                      ///< of all its files
-  int64_t text_bytes = 0;                         ///< of all texts, unpacked
-  int64_t without_access = 0;                     ///< documents that have no access record
+  int64_t with_content = 0;    ///< of these, those with text
+  int64_t bytes_on_disk = 0;   ///< of all its files
+  int64_t text_bytes = 0;      ///< of all texts, unpacked
+  int64_t without_access = 0;  ///< documents that have no access record
+  int64_t clearing = 0;        ///< documents that are deleted, but whose words are still to be taken out (ClearSome)
   std::map<std::string, int64_t> extract_errors;  ///< documents for each reason why content could not be read
   std::map<std::string, std::vector<std::string>> extract_error_examples;  ///< of each reason, one or two paths
 };
@@ -113,6 +114,7 @@ class IndexStore {
   /// or group change: they are searched for.
   virtual AccessReport SetAccess(const std::vector<AccessChange>& changes) = 0;
   virtual void Delete(const std::string& path) = 0;
+  /// Large folders cost no more than a look at the rows of their documents. Their words are left to ClearSome.
   virtual void DeletePrefix(const std::string& prefix) = 0;
   /// Lists documents, uncommitted ones too.
   virtual void Get(const GetRequest& request, const std::function<void(const Json::Value&)>& take) = 0;
@@ -122,7 +124,14 @@ class IndexStore {
   virtual void Rollback() = 0;
   /// How much has been changed since the last commit, in bytes of text, roughly.
   virtual int64_t UncommittedBytes() const = 0;
-  /// Rebuilds the words that are suggested when a search finds nothing.
+  /// How many documents are deleted, uncommitted deletions too, but still to be cleared.
+  virtual int64_t Uncleared() const = 0;
+  /// Takes the words of some of them out, as a transaction of its own of some 50 ms, and commits it. No changes may be
+  /// uncommitted. To be called until Uncleared is 0; what is left at the end of the process is there when the index is
+  /// opened again.
+  virtual void ClearSome() = 0;
+  /// Rebuilds the words that are suggested when a search finds nothing; ClearSome does it at its end while documents
+  /// are to be cleared.
   virtual void RebuildSuggestions() = 0;
 
   virtual SearchReply Search(const SearchRequest& request) = 0;

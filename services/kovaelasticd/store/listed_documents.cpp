@@ -20,6 +20,12 @@ Statement ListedDocuments::Select(int64_t id) {
   return statement;
 }
 
+/// "", which is behind no other, for a document that is to be cleared.
+std::string ListedDocuments::PathIn(const Statement& row) {
+  std::string path = tree_.PathOf(row.Int(1));
+  return path.empty() ? path : path.append(row.Text(2));
+}
+
 std::vector<int64_t> ListedDocuments::Page(const GetRequest& request) {
   const List list = request.suspects ? List::kSuspects : request.unread ? List::kUnread : List::kFile;
   const auto file = list == List::kFile ? static_cast<int64_t>(request.file) : 0;
@@ -57,7 +63,7 @@ void ListedDocuments::Gather(const std::string& after) {
   size_t bytes = 0;
   Statement rows = Select(0);
   while (rows.Step()) {
-    std::string path = tree_.PathOf(rows.Int(1)) + std::string(rows.Text(2));
+    std::string path = PathIn(rows);
     if (path <= after || (!end_.empty() && path > end_)) continue;
     bytes += path.size() + sizeof(Entry);
     kept_.push_back({std::move(path), rows.Int(0)});
@@ -89,7 +95,7 @@ void ListedDocuments::TakeChangesIn(const std::string& after) {
   for (const int64_t id : changed_) {
     Statement row = Select(id);
     if (!row.Step()) continue;
-    std::string path = tree_.PathOf(row.Int(1)) + std::string(row.Text(2));
+    std::string path = PathIn(row);
     if (path > after && (end_.empty() || path <= end_)) kept_.push_back({std::move(path), id});
   }
   std::sort(kept_.begin() + unchanged, kept_.end(), std::greater<>());

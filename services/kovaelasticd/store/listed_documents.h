@@ -38,6 +38,7 @@ class ListedDocuments {
   };
 
   Statement Select(int64_t id);
+  std::string PathIn(const Statement& row);
   void Gather(const std::string& after);
   void Shorten();
   void TakeChangesIn(const std::string& after);

@@ -30,6 +30,8 @@ SqliteStore::SqliteStore(const std::string& path, bool create, std::shared_ptr<c
   links_.MakeTables();
   LoadFieldNames(writer_, names_);
   totals_ = LoadTotals(writer_);
+  clearing_.Load();
+  next_id_ = writer_.QueryInt("SELECT max(id) FROM docs") + 1;
   SyncIndexFolder(Dirname(path));
 }
 
@@ -74,6 +76,7 @@ void SqliteStore::Rollback() {
   tree_.Forget();
   access_.Forget();
   listed_.Forget();
+  clearing_.Forget();
   names_ = FieldNames();
   LoadFieldNames(writer_, names_);
   totals_ = LoadTotals(writer_);
@@ -111,7 +114,20 @@ void SqliteStore::Get(const GetRequest& request, const std::function<void(const 
   for (int64_t left = request.limit; left != 0 && walk.Next(); --left) take(LoadEntry(walk.Document(), request.fields));
 }
 
+void SqliteStore::ClearSome() {
+  if (Uncleared() == 0 || in_transaction_) return;
+  Begin();
+  clearing_.Turn();
+  Commit();
+  if (Uncleared() > 0 || !suggestions_wanted_) return;
+  RebuildSuggestions();
+  Commit();
+}
+
+/// Words of documents that are to be cleared would be counted: it waits for their end.
 void SqliteStore::RebuildSuggestions() {
+  suggestions_wanted_ = Uncleared() > 0;
+  if (suggestions_wanted_) return;
   Begin();
   texts_.Flush();
   engine::RebuildSuggestions(writer_);

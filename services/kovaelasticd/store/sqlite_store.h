@@ -5,6 +5,7 @@
 #include <vector>
 
 #include "services/kovaelasticd/store/access_records.h"
+#include "services/kovaelasticd/store/clearing.h"
 #include "services/kovaelasticd/store/document.h"
 #include "services/kovaelasticd/store/file_links.h"
 #include "services/kovaelasticd/store/folder_tree.h"
@@ -39,12 +40,16 @@ class SqliteStore : public IndexStore {
   void Commit() override;
   void Rollback() override;
   int64_t UncommittedBytes() const override { return uncommitted_bytes_; }
+  int64_t Uncleared() const override { return totals_.clearing; }
+  void ClearSome() override;
   void RebuildSuggestions() override;
   SearchReply Search(const SearchRequest& request) override;  ///< defined in search/, whose parts it is made of
   StoreStat Stat() override;
 
   /// The largest size of the file, in pages; for tests of a full disk. 0: no limit.
   void LimitPages(int64_t pages);
+  /// For tests with few documents.
+  void LimitClearing(const ClearingLimits& limits) { clearing_.SetLimits(limits); }
 
  private:
   /// Opens the transaction that the changes until the next commit share.
@@ -57,6 +62,7 @@ class SqliteStore : public IndexStore {
   void UpdateRow(const StoredDocument& before, const DocRow& row, int64_t text_bytes);
   void Remove(const StoredDocument& stored);
   void RemoveAt(const std::string& path);
+  void RemoveOneByOne(const std::string& prefix);
   /// Keeps the sums, for a text that had `before` bytes and has `after` now.
   void CountText(int64_t before, int64_t after);
   class AccessPass;  ///< access_changes.cpp, as the next two
@@ -77,9 +83,14 @@ class SqliteStore : public IndexStore {
   ListedDocuments listed_{writer_, tree_};
   RowWatch watch_{writer_, [this](auto table, int64_t number, bool is_update) { OnRow(table, number, is_update); }};
   TextWriter texts_{writer_, names_, schema_};
-  Totals totals_;                  ///< with the changes of the open transaction
-  int64_t uncommitted_bytes_ = 0;  ///< for the automatic commit: texts, and a fixed amount for each change
-  bool in_transaction_ = false;    ///< since the first change after a commit
+  Totals totals_;  ///< with the changes of the open transaction
+  Clearing clearing_{writer_, tree_, links_, texts_, totals_};
+  /// What the next new document gets. None gets the number of one that went while the index was open, since readers
+  /// keep numbers of what is to be cleared.
+  int64_t next_id_ = 1;
+  int64_t uncommitted_bytes_ = 0;    ///< for the automatic commit: texts, and a fixed amount for each change
+  bool suggestions_wanted_ = false;  ///< once nothing is left to be cleared
+  bool in_transaction_ = false;      ///< since the first change after a commit
 
   ReaderPool readers_;  ///< for Search and Stat, on any thread
 };

@@ -44,10 +44,10 @@ void SqliteStore::Changed(int64_t bytes) {
 int64_t SqliteStore::InsertRow(const DocRow& row, int64_t text_bytes) {
   Statement statement =
       writer_.Prepare("INSERT INTO docs VALUES(?1, ?2, ?3, ?4, ?5, ?6, ?7, ?8, ?9, ?10, ?11, ?12, ?13)");
-  statement.BindNull(1);
+  const int64_t id = next_id_++;
+  statement.Bind(1, id);
   BindRow(statement, tree_.Make(FolderTree::FolderOf(row.path)), row, text_bytes);
   statement.Run();
-  const int64_t id = sqlite3_last_insert_rowid(writer_.Handle());
   ++totals_.documents;
   CountText(0, text_bytes);
   CountAccess(nullptr, &row);
@@ -174,6 +174,19 @@ void SqliteStore::Delete(const std::string& path) {
 
 void SqliteStore::DeletePrefix(const std::string& prefix) {
   Begin();
+  const int64_t folder = tree_.Find(FolderTree::FolderOf(prefix));
+  if (folder == FolderTree::kNone) return;
+  const std::string begin(FolderTree::LeafOf(prefix));
+  const bool whole = begin.empty() && folder != FolderTree::kTop;
+  for (const int64_t each : whole ? std::vector<int64_t>{folder} : tree_.ChildrenOf(folder, begin)) {
+    if (!clearing_.IsLarge(each)) continue;
+    clearing_.TakeOut(each);
+    Changed(0);
+  }
+  RemoveOneByOne(prefix);
+}
+
+void SqliteStore::RemoveOneByOne(const std::string& prefix) {
   std::vector<StoredDocument> found;
   do {
     found.clear();

@@ -12,7 +12,8 @@ constexpr size_t kIdleMax = 4;
 
 }  // namespace
 
-StoreReader::StoreReader(const std::string& path) : database(path, Database::Mode::kRead) {
+StoreReader::StoreReader(const std::string& path, HiddenDocuments& hidden_documents)
+    : database(path, Database::Mode::kRead), hidden_documents_(hidden_documents) {
   database.Execute("PRAGMA cache_size = -8192");
   RegisterFullText(database);
   database.Execute("CREATE VIRTUAL TABLE temp.meta_terms USING fts5vocab('main', 'meta_fts', 'instance')");
@@ -26,6 +27,7 @@ void StoreReader::Refresh() {
   seen_version_ = version;
   tree.Forget();
   LoadFieldNames(database, names);
+  hidden = hidden_documents_.Of(database);
 }
 
 std::unique_ptr<StoreReader> ReaderPool::Borrow() {
@@ -37,7 +39,7 @@ std::unique_ptr<StoreReader> ReaderPool::Borrow() {
       return reader;
     }
   }
-  return std::make_unique<StoreReader>(path_);
+  return std::make_unique<StoreReader>(path_, hidden_documents_);
 }
 
 void ReaderPool::Return(std::unique_ptr<StoreReader> reader) {

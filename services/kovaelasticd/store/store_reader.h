@@ -5,8 +5,10 @@
 #include <vector>
 
 #include "base/mutex.h"
+#include "services/kovaelasticd/store/doc_set.h"
 #include "services/kovaelasticd/store/document.h"
 #include "services/kovaelasticd/store/folder_tree.h"
+#include "services/kovaelasticd/store/hidden_documents.h"
 #include "services/kovaelasticd/store/sqlite_db.h"
 #include "services/kovaelasticd/store/text_codec.h"
 
@@ -14,7 +16,8 @@ namespace ferrox::engine {
 
 /// A connection that only reads, with what is needed to understand its rows. For one thread at a time.
 struct StoreReader {
-  explicit StoreReader(const std::string& path);
+  /// `hidden_documents`, of the same file, must outlive this.
+  StoreReader(const std::string& path, HiddenDocuments& hidden_documents);
   /// To be called at the beginning of each transaction: learns what was committed since the last one.
   void Refresh();
 
@@ -22,8 +25,11 @@ struct StoreReader {
   FieldNames names;
   FolderTree tree{database};
   TextCodec codec;
+  /// Documents that are deleted but still in the tables; null when there are none.
+  std::shared_ptr<const DocSet> hidden;
 
  private:
+  HiddenDocuments& hidden_documents_;
   int64_t seen_version_ = -1;  ///< of the database, at the last Refresh
 };
 
@@ -41,6 +47,7 @@ class ReaderPool {
 
  private:
   const std::string path_;
+  HiddenDocuments hidden_documents_;
   base::Mutex mutex_;
   std::vector<std::unique_ptr<StoreReader>> idle_ BASE_GUARDED_BY(mutex_);
 };

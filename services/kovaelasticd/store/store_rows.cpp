@@ -35,10 +35,6 @@ StoredDocument ReadRow(const Statement& statement, std::string_view folder_path)
   return stored;
 }
 
-StoredDocument ReadRow(const Statement& statement, FolderTree& tree) {
-  return ReadRow(statement, tree.PathOf(statement.Int(1)));
-}
-
 void BindRow(Statement& statement, int64_t folder, const DocRow& row, int64_t text_bytes) {
   statement.Bind(2, folder).Bind(3, FolderTree::LeafOf(row.path));
   statement.Bind(4, std::string_view(row.name)).Bind(5, std::string_view(row.ext)).Bind(6, int64_t{row.kind});
@@ -63,7 +59,9 @@ std::optional<StoredDocument> FindDocument(Database& database, FolderTree& tree,
   static const std::string sql = std::string(kSelectRow) + "WHERE id = ?1";
   Statement statement = database.Prepare(sql);
   statement.Bind(1, id);
-  return statement.Step() ? std::optional<StoredDocument>(ReadRow(statement, tree)) : std::nullopt;
+  if (!statement.Step()) return std::nullopt;
+  const std::string folder_path = tree.PathOf(statement.Int(1));
+  return folder_path.empty() ? std::nullopt : std::optional<StoredDocument>(ReadRow(statement, folder_path));
 }
 
 Totals LoadTotals(Database& database) {
@@ -76,6 +74,7 @@ Totals LoadTotals(Database& database) {
     if (key == "with_content") totals.with_content = statement.Int(1);
     if (key == "text_bytes") totals.text_bytes = statement.Int(1);
     if (key == "without_access") without_access = statement.Int(1);
+    if (key == "clearing") totals.clearing = statement.Int(1);
   }
   totals.without_access = without_access.value_or(totals.documents);  // a file from before there were records
   return totals;
@@ -85,7 +84,8 @@ void SaveTotals(Database& database, const Totals& totals) {
   const std::pair<std::string_view, int64_t> values[] = {{"documents", totals.documents},
                                                          {"with_content", totals.with_content},
                                                          {"text_bytes", totals.text_bytes},
-                                                         {"without_access", totals.without_access}};
+                                                         {"without_access", totals.without_access},
+                                                         {"clearing", totals.clearing}};
   Statement statement = database.Prepare("INSERT OR REPLACE INTO info(key, value) VALUES(?1, ?2)");
   for (const auto& [key, value] : values) statement.Bind(1, key).Bind(2, value).Run();
 }

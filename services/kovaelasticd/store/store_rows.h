@@ -27,6 +27,7 @@ struct Totals {
   int64_t with_content = 0;
   int64_t text_bytes = 0;
   int64_t without_access = 0;  ///< documents that have no access record
+  int64_t clearing = 0;        ///< documents that count nowhere else any more, but are still to be cleared (Clearing)
 };
 
 /// Selects what ReadRow reads; a condition is to follow.
@@ -34,12 +35,12 @@ inline constexpr char kSelectRow[] =
     "SELECT id, folder, leaf, name, ext, kind, size, mtime, text_bytes, derived, error, packed, access FROM docs ";
 /// The row at hand; `folder_path` is that of its folder.
 StoredDocument ReadRow(const Statement& statement, std::string_view folder_path);
-StoredDocument ReadRow(const Statement& statement, FolderTree& tree);
 /// Binds a row in `folder` to parameters 2 to 13, in the order of the table's columns. All that is bound must live
 /// until the statement has run.
 void BindRow(Statement& statement, int64_t folder, const DocRow& row, int64_t text_bytes);
 
-/// By path or by number; nothing when there is none. @throws Error kEngineStorage, as all that follow.
+/// By path or by number; nothing when there is none, or it is to be cleared. @throws Error kEngineStorage, as all that
+/// follow.
 std::optional<StoredDocument> FindDocument(Database& database, FolderTree& tree, const std::string& path);
 std::optional<StoredDocument> FindDocument(Database& database, FolderTree& tree, int64_t id);
 

@@ -12,13 +12,25 @@ namespace {
 
 /// The reasons why content could not be read, each with its number of documents and one or two of them.
 void ReadFailures(StoreReader& reader, StoreStat& stat) {
-  Statement errors = reader.database.Prepare(
-      "SELECT error, count(*), min(id), max(id) FROM docs WHERE error IS NOT NULL GROUP BY error");
+  struct Found {
+    int64_t count = 0;
+    int64_t first = 0;
+    int64_t last = 0;
+  };
+  std::map<std::string, Found, std::less<>> reasons;
+  Statement errors = reader.database.Prepare("SELECT error, id FROM docs WHERE error IS NOT NULL ORDER BY error, id");
   while (errors.Step()) {
-    const std::string reason(errors.Text(0));
-    stat.extract_errors[reason] = errors.Int(1);
-    for (int column = 2; column <= (errors.Int(1) == 1 ? 2 : 3); ++column) {
-      const auto example = FindDocument(reader.database, reader.tree, errors.Int(column));
+    if (reader.hidden != nullptr && reader.hidden->Contains(errors.Int(1))) continue;
+    auto place = reasons.find(errors.Text(0));
+    if (place == reasons.end()) place = reasons.emplace(errors.Text(0), Found{0, errors.Int(1), 0}).first;
+    ++place->second.count;
+    place->second.last = errors.Int(1);
+  }
+  for (const auto& [reason, found] : reasons) {
+    stat.extract_errors[reason] = found.count;
+    for (const int64_t id : {found.first, found.last}) {
+      if (id == found.first && !stat.extract_error_examples[reason].empty()) continue;
+      const auto example = FindDocument(reader.database, reader.tree, id);
       if (example.has_value()) stat.extract_error_examples[reason].push_back(example->row.path);
     }
   }
@@ -41,6 +53,7 @@ StoreStat ReadStat(ReaderPool& readers) {
   stat.with_content = totals.with_content;
   stat.text_bytes = totals.text_bytes;
   stat.without_access = totals.without_access;
+  stat.clearing = totals.clearing;
   ReadFailures(*reader, stat);
   reader->database.Execute("COMMIT");
   for (const char* suffix : {"", "-wal", "-shm"}) stat.bytes_on_disk += BytesOnDisk(reader->database.Path() + suffix);

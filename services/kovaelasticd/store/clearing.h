@@ -1,0 +1,58 @@
+#pragma once
+
+#include <cstdint>
+#include <string>
+#include <vector>
+
+#include "services/kovaelasticd/store/file_links.h"
+#include "services/kovaelasticd/store/folder_tree.h"
+#include "services/kovaelasticd/store/sqlite_db.h"
+#include "services/kovaelasticd/store/store_rows.h"
+#include "services/kovaelasticd/store/text_writer.h"
+
+namespace ferrox::engine {
+
+struct ClearingLimits {
+  int64_t large = 200;           ///< a folder with so many documents below it is taken out
+  int64_t turn_documents = 500;  ///< what a turn takes out at most: some 50 ms of work, since commits wait for it
+  int64_t turn_bytes = 1 << 20;  ///< the same, of text
+};
+
+/// Deletes folders with all below them in two steps. TakeOut, part of the change that deletes, takes the folder out of
+/// the tree and its documents out of the sums, so that from the commit on nobody finds them (HiddenDocuments); names
+/// can be made again at once. Afterwards Turn takes their rows and words out, the folder that was deleted first before
+/// the others, a few documents in each transaction.
+///
+/// For the thread that writes; every member throws Error kEngineStorage.
+class Clearing {
+ public:
+  /// All outlive this. `totals` are those of the writer.
+  Clearing(Database& database, FolderTree& tree, FileLinks& links, TextWriter& texts, Totals& totals)
+      : database_(database), tree_(tree), links_(links), texts_(texts), totals_(totals) {}
+
+  /// To be called once the database is ready.
+  void Load();
+  /// Whether so much is below the folder that taking it out costs less than removing its documents one by one.
+  bool IsLarge(int64_t folder);
+  /// Takes the folder out, in the transaction that is open.
+  void TakeOut(int64_t folder);
+  /// Takes some of the documents out that are left, in the transaction that is open.
+  void Turn();
+  void SetLimits(const ClearingLimits& limits) { limits_ = limits; }
+  /// After a rollback.
+  void Forget() { folders_.clear(); }
+
+ private:
+  void RemoveDocuments(int64_t folder, int64_t& documents_left, int64_t& bytes_left);
+
+  Database& database_;
+  FolderTree& tree_;
+  FileLinks& links_;
+  TextWriter& texts_;
+  Totals& totals_;
+  ClearingLimits limits_;
+  uint64_t last_name_ = 0;        ///< of the folder taken out last; grows as long as the index is open
+  std::vector<int64_t> folders_;  ///< the folder that is cleared and those below it, which are still there
+};
+
+}  // namespace ferrox::engine
