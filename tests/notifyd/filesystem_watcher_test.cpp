@@ -110,6 +110,7 @@ TEST_F(FilesystemWatcherTest, TellsWhatHappened) {
       {"replaced", [&] { fs::rename(outside + "/full/below", root + "/d"); }, {"created r/d/"}},
       {"folder's mode", [&] { (void)chmod((root + "/d").c_str(), 0700); }, {"attributes r/d/"}},
       {"root's mode", [&] { (void)chmod(root.c_str(), 0700); }, {"attributes r/"}},
+      {"mode above", [&] { (void)chmod(dir_.Path().c_str(), 0710); }, {"attributes r/"}},
       {"into a folder", [&] { fs::rename(root + "/h", root + "/d/h"); }, {"renamed r/h -> r/d/h"}},
       {"exchange",
        [&] { (void)renameat2(AT_FDCWD, (root + "/d").c_str(), AT_FDCWD, (root + "/g").c_str(), RENAME_EXCHANGE); },
@@ -259,6 +260,7 @@ class ReportedTree {
         Move(change.old_path, change.path, change.is_folder);
         break;
       case Change::Kind::kByNumber:
+      case Change::Kind::kAttributesByNumber:
         break;
       case Change::Kind::kUncertain:
         if (is_strict) return "in doubt: " + change.path;

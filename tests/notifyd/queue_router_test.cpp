@@ -153,6 +153,7 @@ TEST_F(QueueRouterTest, EachQueueHearsOfItsFolders) {
       {{Kind::kUncertain, true, "/v"}, "10000 /v/a/ 10000 /v/b/ ", "10000 /v/a/in/ 10000 /v/o/ "},
       {{Kind::kUncertain, true, "/v/a/skip"}, "10000 /v/a/skip/not/ ", ""},
       {{Kind::kUncertain, true, "/v/o/d"}, "", "10000 /v/o/d/ "},
+      {{Kind::kAttributes, true, "/v"}, "4 /v/a/ 4 /v/a/skip/not/ 4 /v/b/ ", "4 /v/o/ "},
   };
   router_.SetQueues(
       {{queue_, {{"/v/a", kAll, {"@eaDir", "skip"}}, {"/v/a/skip/not", kAll}, {"/v/a/plain", 0x2}, {"/v/b/", kAll}}},
@@ -325,8 +326,11 @@ TEST_F(QueueRouterTest, FilesReportedByNumberAreOneLineOrAComparison) {
     (void)router_.Flush(now_);
   }
   EXPECT_EQ("", Lines(queue_)) << "while it is written to";
+  Put({{Kind::kAttributesByNumber, false, "/v", {}, 9}});
+  (void)router_.Flush(now_ + milliseconds(50));
+  EXPECT_EQ("0 /v/ ", Lines(queue_)) << "but for its rights, which are not waited for";
   (void)router_.Flush(now_ + milliseconds(500));
-  EXPECT_EQ("0 /v/ ", Lines(queue_));
+  EXPECT_EQ("0 /v/ 0 /v/ ", Lines(queue_));
 }
 
 }  // namespace ferrox::notifyd

@@ -19,7 +19,7 @@ class WatcherRecorder : public notifyd::WatchListener {
   explicit WatcherRecorder(std::string top) : top_(std::move(top) + "/") {}
 
   void OnChange(notifyd::Change change) override {
-    if (change.kind == notifyd::Change::Kind::kByNumber) return (void)numbers.insert(change.file);
+    if (change.file != 0) return (void)numbers.insert(change.file);
     log.push_back(Text(change));
     changes.push_back(change);
     using Kind = notifyd::Change::Kind;
@@ -64,8 +64,9 @@ class WatcherRecorder : public notifyd::WatchListener {
     return path.compare(0, top_.size(), top_) == 0 ? path.substr(top_.size()) : path;
   }
   std::string Text(const notifyd::Change& change) const {
-    constexpr const char* kNames[] = {"created", "modified", "written", "attributes",
-                                      "deleted", "renamed",  "number",  "uncertain"};
+    constexpr const char* kNames[] = {"created",  "modified", "written", "attributes",
+                                      "deleted",  "renamed",  "number",  "number's attributes",
+                                      "uncertain"};
     std::string text = kNames[static_cast<int>(change.kind)];
     if (!change.old_path.empty()) text += " " + Short(change.old_path) + " ->";
     return text + " " + Short(change.path) + (change.is_folder ? "/" : "");

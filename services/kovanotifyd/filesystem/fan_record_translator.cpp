@@ -54,7 +54,7 @@ void FanRecordTranslator::TranslateName(const FanRecord& record, WatchListener& 
   if ((mask & FAN_CREATE) != 0 && record.IsFolder()) NoteNewFolder(record);
   if (is_in_quiet) parts_.marks.Ignore(record);
   if (!is_in_quiet && !record.IsFolder() && (mask & kFileMask) != 0) ReportByNumber(record, listener);
-  if (paths_.empty()) return;
+  if (paths_.empty()) return ReportAboveRoots(record, listener);
   parts_.history.NoteName(record.target);
 
   if ((mask & FAN_DELETE) != 0 && ReportDeleted(record, listener)) return;
@@ -89,8 +89,18 @@ void FanRecordTranslator::ReportByNumber(const FanRecord& record, WatchListener&
   const std::optional<uint64_t> file = parts_.linked.NumberToReport(record);
   if (!file.has_value()) return parts_.finder.ReportUncertain(record.folder, listener);
   if (*file == 0) return;
+  const bool of_attributes = (record.mask & FAN_ATTRIB) != 0;
   for (const std::string& root : parts_.roots.PathsOn(record.target)) {
-    listener.OnChange({ChangeKind::kByNumber, false, root, {}, *file});
+    listener.OnChange(
+        {of_attributes ? ChangeKind::kAttributesByNumber : ChangeKind::kByNumber, false, root, {}, *file});
+  }
+}
+
+/// Who may not pass a folder may read nothing in the roots below it.
+void FanRecordTranslator::ReportAboveRoots(const FanRecord& record, WatchListener& listener) {
+  if (!record.IsFolder() || (record.mask & FAN_ATTRIB) == 0) return;
+  for (const std::string& root : parts_.roots.At(record.name == "." ? record.folder : record.target)) {
+    Report(listener, ChangeKind::kAttributes, record, root);
   }
 }
 

@@ -65,6 +65,7 @@ class FanRecordTranslator {
   void TranslateRename(const FanRecord& record, WatchListener& listener);
   void ReportRename(const FanRecord& record, WatchListener& listener);
   void ReportByNumber(const FanRecord& record, WatchListener& listener);
+  void ReportAboveRoots(const FanRecord& record, WatchListener& listener);
 
   Parts parts_;
   ExchangeDetector exchanges_;

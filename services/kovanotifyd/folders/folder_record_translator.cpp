@@ -80,7 +80,9 @@ void FolderRecordTranslator::OnFileChanged(Change::Kind kind, const std::string&
   const bool is_gone = number != 0 && (!is_there || status.st_ino != number);
   if (!has_others && !is_gone) return;
   const uint64_t file = is_gone ? number : status.st_ino;
-  for (const std::string& root : roots_.Paths()) listener.OnChange({Change::Kind::kByNumber, false, root, {}, file});
+  const Change::Kind by_number =
+      kind == Change::Kind::kAttributes ? Change::Kind::kAttributesByNumber : Change::Kind::kByNumber;
+  for (const std::string& root : roots_.Paths()) listener.OnChange({by_number, false, root, {}, file});
 }
 
 /// Reported when it is watched, so that a comparison that follows the report misses nothing that is made in it.

@@ -23,6 +23,10 @@ constexpr size_t kUnreportedFilesMax = 10000;
 /// queue on the file system, so a file under constant writing is reported less often.
 constexpr int kLongestByNumber = 6;
 
+/// Changes of attributes by the file's number are reported sooner: rights are to be known within a second.
+constexpr std::chrono::milliseconds kAttributesQuiet{50};
+constexpr std::chrono::milliseconds kAttributesLongest{250};
+
 /// A path of PATH_MAX bytes or more cannot be opened and is not indexed, but folders can be nested to such a depth.
 bool IsTooLong(const std::string& path) { return path.size() >= PATH_MAX; }
 
@@ -36,7 +40,8 @@ std::string NumberKey(uint64_t file, const std::string& root) { return std::to_s
 QueueRouter::QueueRouter(const Options& options)
     : options_(options),
       writes_(options.quiet, options.longest, kUnreportedFilesMax),
-      writes_by_number_(options.quiet, kLongestByNumber * options.longest, kUnreportedFilesMax) {}
+      writes_by_number_(options.quiet, kLongestByNumber * options.longest, kUnreportedFilesMax),
+      attributes_by_number_(kAttributesQuiet, kAttributesLongest, kUnreportedFilesMax) {}
 
 void QueueRouter::SetQueues(const std::map<std::string, std::vector<QueueWatch>>& queues) {
   rules_ = WatchRules(queues);
@@ -63,7 +68,7 @@ void QueueRouter::Put(const Change& change, TimePoint now) {
       writes_.Forget(change.path, change.is_folder);
       return AddToQueues(EVENT_MODIFY, change.path, change.is_folder);
     case Change::Kind::kAttributes:
-      return AddToQueues(EVENT_ATTR, change.path, change.is_folder);
+      return PutAttributes(change);
     case Change::Kind::kDeleted:
       writes_.Forget(change.path, change.is_folder);
       return AddToQueues(EVENT_DELETE, change.path, change.is_folder);
@@ -72,6 +77,8 @@ void QueueRouter::Put(const Change& change, TimePoint now) {
       return PutRename(change);
     case Change::Kind::kByNumber:
       return writes_by_number_.Add(NumberKey(change.file, change.path), now, ReportWriteByNumber());
+    case Change::Kind::kAttributesByNumber:
+      return attributes_by_number_.Add(NumberKey(change.file, change.path), now, ReportWriteByNumber());
     case Change::Kind::kUncertain:
       return PutComparison(change.path);
   }
@@ -91,6 +98,18 @@ void QueueRouter::PutTooLong(const Change& change) {
     if (!IsTooLong(change.path)) return AddToQueues(EVENT_CREATE, change.path, change.is_folder);
   }
   PutComparison(DeepestFolder(change.path));
+}
+
+/// Of a folder also to the queues that watch folders below it, as a change of these: who may not pass it may read
+/// nothing there.
+void QueueRouter::PutAttributes(const Change& change) {
+  AddToQueues(EVENT_ATTR, change.path, change.is_folder);
+  if (!change.is_folder) return;
+  rules_.VisitBelow(change.path, [this](size_t queue, const std::string& watched) {
+    for (const Match& match : rules_.MatchesOf(watched)) {
+      if (match.queue == queue) AddToQueue(match, EVENT_ATTR, watched, true);
+    }
+  });
 }
 
 /// Merges the queues that watch the old path with those that watch the new one; both lists are in the queues' order.
@@ -165,7 +184,8 @@ WriteDebouncer::Report QueueRouter::ReportWriteByNumber() {
 QueueRouter::TimePoint QueueRouter::Flush(TimePoint now) {
   writes_.ReportDue(now, ReportWrite());
   writes_by_number_.ReportDue(now, ReportWriteByNumber());
-  TimePoint next = std::min(writes_.NextDue(), writes_by_number_.NextDue());
+  attributes_by_number_.ReportDue(now, ReportWriteByNumber());
+  TimePoint next = std::min({writes_.NextDue(), writes_by_number_.NextDue(), attributes_by_number_.NextDue()});
   for (QueueWriter* queue : queues_) next = std::min(next, queue->Flush(now));
   return next;
 }
@@ -173,6 +193,7 @@ QueueRouter::TimePoint QueueRouter::Flush(TimePoint now) {
 std::string QueueRouter::FlushAll(TimePoint now) {
   writes_.ReportAll(ReportWrite());
   writes_by_number_.ReportAll(ReportWriteByNumber());
+  attributes_by_number_.ReportAll(ReportWriteByNumber());
   std::string failures;
   for (QueueWriter* queue : queues_) {
     const std::string reason = queue->FlushAll(now);

@@ -65,6 +65,7 @@ class QueueRouter {
   using Match = WatchRules::Match;
 
   void PutTooLong(const Change& change);
+  void PutAttributes(const Change& change);
   void PutRename(const Change& change);
   void AddRename(const Change& change, const Match& from, const Match& to);
   void AddToQueues(uint32_t event, const std::string& path, bool is_folder);
@@ -78,7 +79,9 @@ class QueueRouter {
   std::map<std::string, std::unique_ptr<QueueWriter>> by_path_;
   std::vector<QueueWriter*> queues_;  ///< those of by_path_ in its order; WatchRules counts queues in that order
   WriteDebouncer writes_;             ///< by path
-  WriteDebouncer writes_by_number_;   ///< by a key made of the file's number and a root (Change::Kind::kByNumber)
+  // By a key made of the file's number and a root (Change::Kind::kByNumber, kAttributesByNumber).
+  WriteDebouncer writes_by_number_;
+  WriteDebouncer attributes_by_number_;
 };
 
 }  // namespace ferrox::notifyd
