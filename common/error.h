@@ -45,6 +45,7 @@ class FERROX_EXPORT Error : public std::runtime_error {
     kEngineIndexExists = 1408,      ///< an index of that id exists already, at another place
     kEngineIndexPaused = 1409,      ///< the index is paused
     kEngineIndexRebuilding = 1410,  ///< the index is being rebuilt; what it holds by now was searched
+    kEngineIndexUpgrading = 1411,   ///< the index is brought to the present format; only searches are answered
     kTreeInconsistent = 9999,       ///< a path that the operation tree cannot hold
   };
 

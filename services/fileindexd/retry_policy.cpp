@@ -31,6 +31,7 @@ constexpr Row kRows[] = {
     {Problem::kContentUnavailable, State::kWaitingForContent, nullptr, true, seconds(1), seconds(30)},
     {Problem::kIndexPaused, State::kPaused, "the share's index is paused; 'fileindexctl share resume' resumes it", true,
      milliseconds(500), seconds(10)},
+    {Problem::kIndexUpgrading, State::kWaitingForEngine, nullptr, true, seconds(1), seconds(1)},
     {Problem::kIndexMissing, State::kWaitingForEngine, nullptr, false, milliseconds(500), seconds(2)},
     {Problem::kEngineRestarted, State::kWaitingForEngine, nullptr, false, milliseconds(100), seconds(2)},
     {Problem::kOther, State::kError, nullptr, true, seconds(2), seconds(300)},
@@ -66,6 +67,7 @@ Problem RetryPolicy::Classify(const Failure& failure) const {
   if (failure.code == Error::kEngineUnreachable) return Problem::kEngineUnreachable;
   if (failure.code == Error::kParseFailed) return Problem::kContentUnavailable;
   if (failure.code == Error::kEngineIndexPaused) return Problem::kIndexPaused;
+  if (failure.code == Error::kEngineIndexUpgrading) return Problem::kIndexUpgrading;
   if (failure.code == Error::kEngineNoSuchIndex) return Problem::kIndexMissing;
   // An engine that was killed fails one request so that what it had not committed is sent again; a second one in a row
   // is a storage that does not work.

@@ -13,6 +13,7 @@ enum class Problem {
   kEngineUnreachable,   ///< the search engine does not answer
   kContentUnavailable,  ///< content extraction as a whole does not work
   kIndexPaused,         ///< the engine has the share's index paused
+  kIndexUpgrading,      ///< the engine brings the index's file to a newer format
   kIndexMissing,        ///< the engine has no index of the share
   kEngineRestarted,     ///< the engine lost what it had not committed, and says so once
   kOther,               ///< any other Error

@@ -17,6 +17,7 @@
 #include <cstdint>
 #include <memory>
 
+#include "base/priority.h"
 #include "services/kovacontentextractd/worker_protocol.h"
 
 namespace ferrox::extract {
@@ -28,7 +29,6 @@ namespace {
 // the worker runs nevertheless.
 
 constexpr uid_t kNobody = 65534;
-constexpr int kNiceness = 10;
 /// In all its life; a worker is replaced after some hundreds of files.
 constexpr rlim_t kCpuSecondsPerProcess = 3600;
 constexpr rlim_t kFilesMax = 16;  // the three usual ones, the daemon's socket, the file, and copies of it
@@ -59,13 +59,6 @@ bool DropCapabilities() {
   __user_cap_header_struct header = {_LINUX_CAPABILITY_VERSION_3, 0};
   const __user_cap_data_struct none[_LINUX_CAPABILITY_U32S_3] = {};
   return syscall(SYS_capset, &header, none) == 0;
-}
-
-/// Reading for the index is never urgent: others come first at processor and disk.
-bool YieldToOthers() {
-  constexpr int kWhoProcess = 1, kIdleClass = 3, kClassShift = 13;
-  const bool disk = syscall(SYS_ioprio_set, kWhoProcess, 0, kIdleClass << kClassShift) == 0;
-  return setpriority(PRIO_PROCESS, 0, kNiceness) == 0 && disk;
 }
 
 /// As newer kernels know it; an older one takes the beginning.
@@ -212,7 +205,7 @@ std::vector<std::string> CloseSandbox() {
   const auto note = [&missing](bool closed, const char* name) {
     if (!closed) missing.emplace_back(name);
   };
-  note(YieldToOthers(), "idle priority");
+  note(base::YieldToOthers(), "idle priority");
   note(LimitResources(), "resource limits");
   note(CloseFileSystem(), "Landlock");
   note(CloseSystemCalls(), "seccomp");

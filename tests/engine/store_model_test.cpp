@@ -1,10 +1,5 @@
 // Catches documents that get lost in the tree of folders, stand in another order than that of their paths' bytes, or
-// have another's access record, which folders have, too: random changes beside a model that knows whole paths only; and
-// what an upgrade of an older file loses.
-#include <zstd.h>
-
-#include <fstream>
-#include <iterator>
+// have another's access record, which folders have, too: random changes beside a model that knows whole paths only.
 #include <map>
 #include <random>
 
@@ -316,66 +311,6 @@ TEST(StoreModelTest, AnySequenceOfChangesLeavesTheDocumentsOfTheModel) {
     }
     model.CheckWords();
   }
-}
-
-/// An index as an engine of format 2 has written it.
-void UnpackKept(const std::string& to) {
-  std::ifstream packed_file(FERROX_TEST_DATA "/index_format_2.sqlite.zst", std::ios::binary);
-  const std::string packed((std::istreambuf_iterator<char>(packed_file)), {});
-  std::string bytes(ZSTD_getFrameContentSize(packed.data(), packed.size()), '\0');
-  ASSERT_EQ(bytes.size(), ZSTD_decompress(bytes.data(), bytes.size(), packed.data(), packed.size()));
-  std::ofstream(to, std::ios::binary) << bytes;
-}
-
-TEST(StoreUpgradeTest, AFileOfFormat2AnswersAsBefore) {
-  const test::TempDir folder;
-  UnpackKept(folder / "index.sqlite");
-  Json::Value mappings;
-  for (const char* name : {"KOVAMDPath", "KOVAMDParent"}) mappings["properties"][name]["_all"] = false;
-  SqliteStore store(folder / "index.sqlite", false, std::make_shared<Schema>(mappings));
-  std::string listed;
-  const auto list = [&listed](const Json::Value& entry) {
-    listed += entry["KOVAMDPath"].asString() + "|";
-    EXPECT_EQ(entry["KOVAMDPath"].asString(),
-              entry["KOVAMDParent"].asString() + "/" + entry["KOVAMDFSName"].asString());
-  };
-  store.Get({"", "/v/", "", -1, {}}, list);
-  EXPECT_EQ(listed,
-            "/v/other/deep/er/x.txt|/v/photo|/v/photo-list.txt|/v/photo/2023|/v/photo/2023/b|"
-            "/v/photo/2023/harbour.txt|/v/photo/notes.txt|");
-  listed.clear();
-  GetRequest suspects;
-  suspects.suspects = true;
-  store.Get(suspects, list);
-  EXPECT_EQ(listed, "/v/photo/2023/harbour.txt|") << "the file's other name has changed";
-  EXPECT_EQ(store.Stat().extract_error_examples["not text"], std::vector<std::string>{"/v/photo/notes.txt"});
-  EXPECT_EQ(FindPaths(store, "boats path:/v/photo"), "/v/photo/2023/b\n/v/photo/2023/harbour.txt\n/v/photo/notes.txt");
-  store.Delete("/v/photo/2023/harbour.txt");
-  store.MoveFolder("/v/photo", "", Moved("/v/pictures"));
-  store.Commit();
-  EXPECT_EQ(FindPaths(store, "boats path:/v/pictures"), "/v/pictures/2023/b\n/v/pictures/notes.txt");
-  EXPECT_EQ(FindPaths(store, "harbour"), "") << "its words could be taken out";
-}
-
-TEST(StoreUpgradeTest, AFileOfANewerFormatIsRefusedAndLeftAlone) {
-  const test::TempDir folder;
-  const std::string path = folder / "index.sqlite";
-  { const SqliteStore store(path, true, PlainSchema()); }
-  { Database(path, Database::Mode::kWrite).Execute("PRAGMA user_version = 99"); }
-  const auto content = [&path] {
-    std::ifstream file(path, std::ios::binary);
-    return std::string((std::istreambuf_iterator<char>(file)), {});
-  };
-  const std::string before = content();
-  try {
-    const SqliteStore store(path, true, PlainSchema());
-    FAIL() << "it was opened";
-  } catch (const IndexDamaged&) {
-    FAIL() << "it would be set aside";
-  } catch (const Error& error) {
-    EXPECT_NE(std::string(error.what()).find("format 99"), std::string::npos) << error.what();
-  }
-  EXPECT_EQ(before, content());
 }
 
 }  // namespace

@@ -74,6 +74,16 @@ void AddRebuilding(const RebuildState& state, Json::Value& result) {
   result["rebuilding"]["reason"] = state.Reason();
 }
 
+/// "upgrading" with how far it is, and why it waits, until the index has the present format.
+void AddUpgrading(Index& index, Json::Value& result) {
+  const std::optional<UpgradeProgress> progress = index.Upgrading();
+  if (!progress.has_value()) return;
+  Json::Value& upgrading = result["upgrading"];
+  upgrading["done"] = Json::Int64(progress->done);
+  upgrading["of"] = Json::Int64(progress->of);
+  if (!progress->problem.empty()) upgrading["problem"] = progress->problem;
+}
+
 Json::Value OnIndexConfigSet(CommandCall& call) {
   const std::string id = IndexId(call.data);
   const Json::Value& changes = RequiredObject(call.data, "data");
@@ -98,7 +108,9 @@ Json::Value OnIndexList(CommandCall& call) {
     AddRebuilding(listed.rebuild, entry);
     try {
       if (figures && !listed.paused) {
-        entry["documents"] = Json::Int64(call.registry.Open(listed.id).index->Stat().documents);
+        const Registry::OpenIndex open = call.registry.Open(listed.id);
+        entry["documents"] = Json::Int64(open.index->Stat().documents);
+        AddUpgrading(*open.index, entry);
       }
     } catch (const Error& error) {
       entry["error"] = error.what();  // one unusable index does not hide the others
@@ -120,6 +132,7 @@ Json::Value OnIndexStat(CommandCall& call) {
   if (stat.clearing > 0) result["clearing"] = Json::Int64(stat.clearing);
   result["uncommitted"] = Json::Int64(open.index->Uncommitted());
   AddRebuilding(open.rebuild, result);
+  AddUpgrading(*open.index, result);
   result["extract_errors"] = Json::Value(Json::objectValue);
   for (const auto& [reason, count] : stat.extract_errors) result["extract_errors"][reason] = Json::Int64(count);
   result["extract_error_examples"] = Json::Value(Json::objectValue);

@@ -18,21 +18,25 @@ using SteadyClock = std::chrono::steady_clock;
 constexpr std::chrono::milliseconds kClearLatest{250};
 constexpr std::chrono::seconds kClearAgain{60};
 
+constexpr char kClosedText[] = "the index was closed meanwhile; resume it";
 constexpr char kLostText[] =
     "changes since the last commit were lost, because the engine was killed or its disk was full; send them again";
 
 }  // namespace
 
 Index::Index(std::unique_ptr<IndexStore> store, std::string marker_path, std::chrono::milliseconds auto_commit_after,
-             std::function<void()> on_damage, std::unique_ptr<Scrubber> scrubber)
+             std::function<void()> on_damage, std::unique_ptr<Scrubber> scrubber, std::unique_ptr<IndexUpgrade> upgrade)
     : store_(std::move(store)),
+      upgrade_(std::move(upgrade)),
       scrubber_(std::move(scrubber)),
       marker_path_(std::move(marker_path)),
       auto_commit_after_(auto_commit_after),
       on_damage_(std::move(on_damage)) {
   lost_ = access(marker_path_.c_str(), F_OK) == 0;
   marked_ = lost_;
+  upgrading_ = upgrade_ != nullptr;
   thread_ = std::thread(&Index::ThreadMain, this);
+  if (upgrade_ != nullptr) upgrade_->Start([this] { TakeUpgraded(); }, on_damage_);
 }
 
 Index::~Index() { Close(); }
@@ -58,7 +62,8 @@ void Index::Submit(Kind kind, const Job* job) {
   Task task{kind, job, nullptr, false};
   {
     const base::MutexLock lock(mutex_);
-    if (stopping_) throw Error(Error::kEngineIndexPaused, "the index was closed meanwhile; resume it");
+    if (stopping_) throw Error(Error::kEngineIndexPaused, kClosedText);
+    if (upgrading_) throw Error(Error::kEngineIndexUpgrading, DescribeUpgrade(upgrade_->Progress()));
     tasks_.push_back(&task);
     wake_thread_.NotifyOne();
     while (!task.done) wake_callers_.Wait(mutex_);
@@ -66,26 +71,51 @@ void Index::Submit(Kind kind, const Job* job) {
   if (task.failure != nullptr) std::rethrow_exception(task.failure);
 }
 
-SearchReply Index::Search(const SearchRequest& request) {
+/// Has `use` read the store or, where there is none yet, the file that is being upgraded.
+template <typename Use>
+auto Index::Reading(Use use) {
+  base::MutexLock entering(readers_mutex_);
   const base::ReaderLock guard(store_mutex_);
-  if (store_ == nullptr) throw Error(Error::kEngineIndexPaused, "the index was closed meanwhile; resume it");
-  return ReportingDamage([&] { return store_->Search(request); });
+  entering.Unlock();
+  if (store_ == nullptr && upgrade_ == nullptr) throw Error(Error::kEngineIndexPaused, kClosedText);
+  return ReportingDamage([&] { return store_ != nullptr ? use(*store_) : use(*upgrade_); });
+}
+
+SearchReply Index::Search(const SearchRequest& request) {
+  return Reading([&](auto& from) { return from.Search(request); });
 }
 
 StoreStat Index::Stat() {
+  return Reading([](auto& from) { return from.Stat(); });
+}
+
+std::optional<UpgradeProgress> Index::Upgrading() {
   const base::ReaderLock guard(store_mutex_);
-  if (store_ == nullptr) throw Error(Error::kEngineIndexPaused, "the index was closed meanwhile; resume it");
-  return ReportingDamage([&] { return store_->Stat(); });
+  if (store_ != nullptr || upgrade_ == nullptr) return std::nullopt;
+  return upgrade_->Progress();
+}
+
+/// By the upgrade's thread, once the new file is written. Searches that run finish first, others wait a moment.
+void Index::TakeUpgraded() {
+  const base::MutexLock entering(readers_mutex_);
+  const base::WriterLock guard(store_mutex_);
+  store_ = upgrade_->Finish();
+  const base::MutexLock lock(mutex_);
+  upgrading_ = false;
+  wake_thread_.NotifyOne();
 }
 
 void Index::Close() {
+  if (upgrade_ != nullptr) upgrade_->Stop();
   {
     const base::MutexLock lock(mutex_);
     stopping_ = true;
     wake_thread_.NotifyOne();
   }
   if (thread_.joinable()) thread_.join();
+  const base::MutexLock entering(readers_mutex_);
   const base::WriterLock guard(store_mutex_);
+  upgrade_.reset();
   scrubber_.reset();  // the last connection that is closed empties the log, and removes it: the store's
   store_.reset();
 }
@@ -114,10 +144,18 @@ std::deque<Index::Task*> Index::WaitForTasks() {
   return tasks;
 }
 
+/// Nothing is submitted until there is a store. @return whether there is one; else the index is being closed.
+bool Index::WaitForStore() {
+  const base::MutexLock lock(mutex_);
+  while (upgrading_ && !stopping_) wake_thread_.Wait(mutex_);
+  return !upgrading_;
+}
+
 /// Runs tasks in turns: changes and reads of one turn in their order, then one commit for all of them that ask for it.
 /// A commit waits for the disk; callers that come meanwhile share the next turn, so the rate of commits adapts to the
 /// disk.
 void Index::ThreadMain() {
+  if (!WaitForStore()) return;
   for (;;) {
     const std::deque<Task*> tasks = WaitForTasks();
     std::deque<Task*> commits;

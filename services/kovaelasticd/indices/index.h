@@ -11,6 +11,7 @@
 #include <thread>
 
 #include "base/mutex.h"
+#include "services/kovaelasticd/indices/index_upgrade.h"
 #include "services/kovaelasticd/store/index_store.h"
 #include "services/kovaelasticd/store/scrubber.h"
 
@@ -23,17 +24,20 @@ namespace ferrox::engine {
 /// disk, or a process that died: a marker file beside the index tells), the next commit fails, so that the sender
 /// of the changes sends them again. While the thread has nothing else to do, it clears what is left of deleted folders,
 /// and has the scrubber look after the file.
+///
+/// An index whose file has an older format is upgraded first: until then it has no store, and only Search and Stat are
+/// answered, from the old file.
 class Index {
  public:
   static constexpr std::chrono::milliseconds kAutoCommitAfter{5000};
   static constexpr int64_t kAutoCommitBytes = 64 << 20;
 
   /// `marker_path` is the file that exists while there are uncommitted changes. `on_damage` is called, by any thread,
-  /// when the store or the scrubber, which may be null, finds the file damaged.
+  /// when the store or the scrubber, which may be null, finds the file damaged. With an `upgrade`, `store` is null.
   Index(
       std::unique_ptr<IndexStore> store, std::string marker_path,
       std::chrono::milliseconds auto_commit_after = kAutoCommitAfter, std::function<void()> on_damage = [] {},
-      std::unique_ptr<Scrubber> scrubber = nullptr);
+      std::unique_ptr<Scrubber> scrubber = nullptr, std::unique_ptr<IndexUpgrade> upgrade = nullptr);
   Index(const Index&) = delete;
   Index& operator=(const Index&) = delete;
   /// Commits and closes.
@@ -42,7 +46,7 @@ class Index {
   using Job = std::function<void(IndexStore&)>;
   /// Has `job` run by the index's thread and waits for it; what it throws is thrown here. After kEngineStorage the
   /// changes since the last commit are gone.
-  /// @throws Error kEngineIndexPaused when the index was closed meanwhile.
+  /// @throws Error kEngineIndexPaused when the index was closed meanwhile; kEngineIndexUpgrading.
   void Write(const Job& job);
   /// The same for a job that changes nothing.
   void Read(const Job& job);
@@ -53,6 +57,8 @@ class Index {
   StoreStat Stat();
   /// The number of changes that are not committed yet.
   int64_t Uncommitted() const { return uncommitted_; }
+  /// Nothing when the index has the present format.
+  std::optional<UpgradeProgress> Upgrading();
   /// Commits and closes the store; waits for what runs.
   void Close();
 
@@ -69,6 +75,10 @@ class Index {
 
   /// Queues a task and waits until it is done.
   void Submit(Kind kind, const Job* job);
+  template <typename Use>
+  auto Reading(Use use);
+  void TakeUpgraded();
+  bool WaitForStore();
   void ThreadMain();
   std::optional<std::chrono::steady_clock::time_point> NextOwnWork() const;
   std::deque<Task*> WaitForTasks();
@@ -85,11 +95,13 @@ class Index {
   template <typename Run>
   auto ReportingDamage(Run run);
 
-  /// Held for reading by a search and a figure of the store, for writing by Close. The thread, which alone writes to
-  /// the store, uses it without: Close waits for its end first.
+  /// Held for reading by a search and a figure of the store, for writing by Close and at the end of an upgrade. The
+  /// thread, which alone writes to the store, uses it without: Close waits for its end first.
   base::SharedMutex store_mutex_;
+  base::Mutex readers_mutex_;  ///< held by each reader until it has store_mutex_, so that a writer is not starved
   std::unique_ptr<IndexStore> store_;
-  std::unique_ptr<Scrubber> scrubber_;  ///< of the thread alone, until Close
+  std::unique_ptr<IndexUpgrade> upgrade_;  ///< until Close, also when it is complete
+  std::unique_ptr<Scrubber> scrubber_;     ///< of the thread alone, until Close
   const std::string marker_path_;
   const std::chrono::milliseconds auto_commit_after_;
   const std::function<void()> on_damage_;
@@ -99,6 +111,7 @@ class Index {
   base::ConditionVariable wake_callers_;             ///< some tasks are done
   std::deque<Task*> tasks_ BASE_GUARDED_BY(mutex_);  ///< of callers that wait, in the order of their calls
   bool stopping_ BASE_GUARDED_BY(mutex_) = false;
+  bool upgrading_ BASE_GUARDED_BY(mutex_) = false;  ///< there is no store yet
 
   // Of the thread alone, except for reading the count.
   std::atomic<int64_t> uncommitted_{0};

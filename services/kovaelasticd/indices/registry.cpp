@@ -9,6 +9,7 @@
 #include "services/kovaelasticd/store/index_files.h"
 #include "services/kovaelasticd/store/sqlite_db.h"
 #include "services/kovaelasticd/store/sqlite_store.h"
+#include "services/kovaelasticd/store/store_format.h"
 
 namespace ferrox::engine {
 
@@ -28,18 +29,26 @@ Registry::Registry(const std::string& state_folder) : table_(state_folder + "/in
 
 Registry::~Registry() = default;
 
-/// Opens the store, or makes it with `create`, when the index is not open already. What the index calls on damage only
-/// sets flags: it may hold locks of its own, and HealDamaged does the rest once the request is answered.
+/// Opens the store, or makes it with `create`, when the index is not open already. A file of an older format is
+/// upgraded by the index itself. What the index calls on damage only sets flags: it may hold locks of its own, and
+/// HealDamaged does the rest once the request is answered.
 void Registry::OpenSlot(IndexSlot& slot, const std::string& path, bool create) {
   if (slot.index != nullptr) return;
-  auto store = std::make_unique<SqliteStore>(IndexFile(path), create, slot.schema);
+  const std::string file = IndexFile(path);
+  std::unique_ptr<IndexUpgrade> upgrade;
+  std::unique_ptr<IndexStore> store;
+  if (!IsIndexFileLost(path) && NeedsUpgrade(file)) {
+    upgrade = std::make_unique<IndexUpgrade>(file, slot.schema);
+  } else {
+    store = std::make_unique<SqliteStore>(file, create, slot.schema);
+  }
   slot.index = std::make_shared<Index>(
       std::move(store), MarkerFile(path), Index::kAutoCommitAfter,
       [this, damaged = slot.damaged] {
         *damaged = true;
         any_damaged_ = true;
       },
-      std::make_unique<Scrubber>(IndexFile(path)));
+      std::make_unique<Scrubber>(file), std::move(upgrade));
 }
 
 /// Commits and closes; searches that run finish first.

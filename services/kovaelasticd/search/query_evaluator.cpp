@@ -7,6 +7,7 @@
 #include "base/path.h"
 #include "fileindex/util.h"
 #include "services/kovaelasticd/store/document.h"
+#include "services/kovaelasticd/store/older_format.h"
 #include "services/kovaelasticd/store/store_rows.h"
 #include "services/kovaelasticd/text/words.h"
 
@@ -155,6 +156,7 @@ DocSet QueryEvaluator::EvaluateFilter(const QueryNode& node) {
 /// are listed; beyond that one walk over the list of all documents by folder is cheaper.
 DocSet QueryEvaluator::DocumentsAt(const std::string& path) {
   constexpr size_t kFoldersListed = 1000;
+  if (tree_.IsFlat()) return DocumentsAtWholePath(database_, path);
   DocSet found;
   const std::optional<StoredDocument> itself = FindDocument(database_, tree_, path);
   if (itself.has_value()) found.Add(itself->id);

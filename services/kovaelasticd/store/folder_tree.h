@@ -29,8 +29,10 @@ class FolderTree {
   static constexpr int64_t kTop = 1;    ///< the folder "/"
   static constexpr int64_t kGone = -1;  ///< what folders that were taken out have above them
 
-  /// `database` must outlive this.
-  explicit FolderTree(Database& database) : database_(database) {}
+  /// `database` must outlive this. `flat`: in a file of a format without the tree, all documents lie in "/", with the
+  /// rest of their path as leaf.
+  explicit FolderTree(Database& database, bool flat = false) : database_(database), flat_(flat) {}
+  bool IsFlat() const { return flat_; }
 
   /// The part of a path that is its folder, with the "/" at its end. "/" at least: paths are absolute.
   static std::string_view FolderOf(std::string_view path) { return path.substr(0, path.rfind('/') + 1); }
@@ -85,6 +87,7 @@ class FolderTree {
   bool IsEmpty(int64_t folder);
 
   Database& database_;
+  const bool flat_;
   std::unordered_map<int64_t, Node> nodes_;
   std::map<std::pair<int64_t, std::string>, int64_t> children_;  ///< by parent and name, those of nodes_
 };

@@ -83,10 +83,17 @@ void SetAside(const std::string& path, int64_t now) {
 void SetAsideIndexFiles(const std::string& folder, int64_t now) {
   if (!IsIndexFileLost(folder)) SetAside(IndexFile(folder), now);
   for (const char* suffix : {"-wal", "-shm"}) (void)Unlink(IndexFile(folder) + suffix);
+  RemoveUpgradeFile(IndexFile(folder));
   (void)Unlink(MarkerFile(folder));
 }
 
 std::string IndexFile(const std::string& folder) { return folder + "/index.sqlite"; }
+
+std::string UpgradeFile(const std::string& index_file) { return index_file + ".upgrade"; }
+
+void RemoveUpgradeFile(const std::string& index_file) {
+  for (const char* suffix : {"", "-wal", "-shm"}) (void)Unlink(UpgradeFile(index_file) + suffix);
+}
 
 std::string MarkerFile(const std::string& folder) { return folder + "/uncommitted"; }
 
@@ -105,6 +112,7 @@ void RemoveIndexFiles(const std::string& folder) {
     const std::string path = IndexFile(folder) + suffix;
     FERROX_FAIL_IF(!Unlink(path), Error::kEngineStorage, "cannot remove " + path + ": " + ErrnoText());
   }
+  RemoveUpgradeFile(IndexFile(folder));
   (void)Unlink(MarkerFile(folder));
   RemoveSetAside(IndexFile(folder));
   (void)rmdir(folder.c_str());  // other files in it are not ours

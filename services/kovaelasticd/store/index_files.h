@@ -6,11 +6,16 @@
 namespace ferrox::engine {
 
 // An index's folder holds "index.sqlite", SQLite's "-wal" and "-shm" beside it while it is open, the marker
-// "uncommitted" while there are changes that are not committed, and "index.sqlite.damaged-DATE", set aside.
+// "uncommitted" while there are changes that are not committed, "index.sqlite.upgrade" during an upgrade, and
+// "index.sqlite.damaged-DATE", set aside.
 
 /// The files of the index in `folder`.
 std::string IndexFile(const std::string& folder);
 std::string MarkerFile(const std::string& folder);
+/// What the file of an index is upgraded in, beside it.
+std::string UpgradeFile(const std::string& index_file);
+/// Removes it, if there is one.
+void RemoveUpgradeFile(const std::string& index_file);
 
 /// Makes the names in an index's folder durable. @throws Error kEngineStorage.
 void SyncIndexFolder(const std::string& folder);

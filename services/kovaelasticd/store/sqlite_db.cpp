@@ -59,6 +59,11 @@ Statement& Statement::BindNull(int index) {
   return *this;
 }
 
+Statement& Statement::BindColumn(int index, const Statement& row, int column) {
+  database_->Check(sqlite3_bind_value(statement_, index, sqlite3_column_value(row.statement_, column)));
+  return *this;
+}
+
 Statement& Statement::BindPointer(int index, void* object, const char* type) {
   database_->Check(sqlite3_bind_pointer(statement_, index, object, type, nullptr));
   return *this;
@@ -131,6 +136,10 @@ void Database::Fail(int result) {
   const char* detail = handle_ != nullptr ? sqlite3_errmsg(handle_.get()) : "";
   const std::string reason = "index file " + path_ + ": " + Remedy(result);
   const FailSite site = {__FILE__, __LINE__, __func__, detail};
+  if ((result & 0xFF) == SQLITE_FULL) {
+    LogFailure(site, 0, reason);
+    throw VolumeFull(reason);
+  }
   if (!IsDamage(result)) ::ferrox::Fail(site, 0, Error::kEngineStorage, reason);
   LogFailure(site, 0, reason);
   throw IndexDamaged(reason);

@@ -19,6 +19,12 @@ class IndexDamaged : public Error {
   explicit IndexDamaged(const std::string& reason) : Error(Error::kEngineStorage, reason) {}
 };
 
+/// The volume of the file is full.
+class VolumeFull : public Error {
+ public:
+  explicit VolumeFull(const std::string& reason) : Error(Error::kEngineStorage, reason) {}
+};
+
 class Database;
 
 /// A thin layer over SQLite's C interface: owners for its handles, exceptions for its codes.
@@ -41,6 +47,8 @@ class Statement {
   Statement& Bind(int index, std::string_view text);
   Statement& BindBlob(int index, std::string_view bytes);
   Statement& BindNull(int index);
+  /// What another statement has in a column of its row.
+  Statement& BindColumn(int index, const Statement& row, int column);
   /// Lends an object to a function of ours, which asks for it by `type`.
   Statement& BindPointer(int index, void* object, const char* type);
 
@@ -53,6 +61,7 @@ class Statement {
 
   // The row at hand, after a Step that returned true.
   int64_t Int(int column) const { return sqlite3_column_int64(statement_, column); }
+  bool IsBlob(int column) const { return sqlite3_column_type(statement_, column) == SQLITE_BLOB; }
   bool IsNull(int column) const { return sqlite3_column_type(statement_, column) == SQLITE_NULL; }
   /// Valid until the next step.
   std::string_view Text(int column) const;

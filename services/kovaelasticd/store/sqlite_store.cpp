@@ -26,7 +26,7 @@ IndexStore::~IndexStore() = default;
 
 SqliteStore::SqliteStore(const std::string& path, bool create, std::shared_ptr<const Schema> schema)
     : schema_(std::move(schema)), writer_(path, OpeningMode(path, create)), readers_(path) {
-  PrepareStore(writer_, create, *schema_);
+  PrepareStore(writer_, create);
   links_.MakeTables();
   LoadFieldNames(writer_, names_);
   totals_ = LoadTotals(writer_);

@@ -2,10 +2,9 @@
 
 #include "services/kovaelasticd/store/store_format.h"
 
-#include <syslog.h>
+#include <cerrno>
 
 #include "common/log.h"
-#include "services/kovaelasticd/store/folder_tree.h"
 #include "services/kovaelasticd/store/fts.h"
 
 namespace ferrox::engine {
@@ -63,70 +62,19 @@ constexpr const char* kTables[] = {
     "INSERT INTO meta_fts(meta_fts, rank) VALUES('pgsz', 8100)",
 };
 
-void SetFormat(Database& database) { database.Execute("PRAGMA user_version = " + std::to_string(kStoreFormat)); }
-
-void MakeTables(Database& database) {
-  database.Execute("BEGIN IMMEDIATE");
-  database.Execute("PRAGMA application_id = " + std::to_string(kApplicationId));
-  SetFormat(database);
-  for (const char* sql : kDocumentTables) database.Execute(sql);
-  for (const char* sql : kDocumentIndexes) database.Execute(sql);
-  for (const char* sql : kTables) database.Execute(sql);
-  database.Execute("COMMIT");
-}
-
-/// Format 2 took the words of folders' names for words of each document, unless the mappings said otherwise.
-bool PathsArePlain(const Json::Value& mappings) {
-  const Json::Value by_default = mappings.isObject() ? mappings["default"].get("_all", true) : Json::Value(true);
-  const auto is_plain = [&](const char* name) {
-    const Json::Value& field = mappings.isObject() ? mappings["properties"][name] : Json::Value::nullSingleton();
-    return field.isObject() ? field.get("_all", by_default) != false : by_default != false;
-  };
-  return is_plain(field::kPath) || is_plain(field::kParent);
-}
-
-/// Gives each document of format 2, whose row had its whole path, its place in the tree of folders. Numbers stay, and
-/// so do all words and texts, which go by them.
-void UpgradeFrom2(Database& database, const Schema& schema) {
-  FERROX_FAIL_IF(PathsArePlain(schema.Mappings()), Error::kEngineStorage,
-                 "index file " + database.Path() +
-                     ": it has format 2, and words of folders' names in it; 'fileindexctl rebuild' makes it anew");
-  Log(LOG_NOTICE, "index file %s: it has format 2, and is brought to format %d", database.Path().c_str(),
-      static_cast<int>(kStoreFormat));
-  database.Execute("BEGIN IMMEDIATE");
-  try {
-    database.Execute("ALTER TABLE docs RENAME TO docs_2");
-    for (const char* sql : kDocumentTables) database.Execute(sql);
-    FolderTree tree(database);
-    Statement documents = database.Prepare("SELECT id, path FROM docs_2 ORDER BY path");
-    Statement copy = database.Prepare(
-        "INSERT INTO docs SELECT id, ?2, ?3, name, ext, kind, size, mtime, text_bytes, derived, error, packed, 0"
-        " FROM docs_2 WHERE id = ?1");
-    while (documents.Step()) {
-      const std::string path(documents.Text(1));
-      const int64_t folder = tree.Make(FolderTree::FolderOf(path));
-      copy.Bind(1, documents.Int(0)).Bind(2, folder).Bind(3, FolderTree::LeafOf(path)).Run();
-    }
-    documents.Reset();
-    database.Execute("DROP TABLE docs_2");
-    for (const char* sql : kDocumentIndexes) database.Execute(sql);
-    SetFormat(database);
-    database.Execute("COMMIT");
-  } catch (...) {
-    (void)sqlite3_exec(database.Handle(), "ROLLBACK", nullptr, nullptr, nullptr);
-    throw;
-  }
-}
+/// AccessRecords: each distinct record, by the number that documents and folders have.
+constexpr const char* kAccessTables[] = {
+    ("CREATE TABLE access(id INTEGER PRIMARY KEY, uid INTEGER NOT NULL, gid INTEGER NOT NULL, mode INTEGER NOT NULL,"
+     " acl TEXT NOT NULL)"),
+    "CREATE UNIQUE INDEX access_record ON access(uid, gid, mode, acl)",
+};
 
 /// Files of format 3 that were made before rights were recorded lack this: a table, and a column for its numbers, which
 /// are at the end of rows so that adding them rewrites none.
 void AddAccess(Database& database) {
   if (database.QueryInt("SELECT count(*) FROM sqlite_master WHERE name = 'access'") != 0) return;
   database.Execute("BEGIN IMMEDIATE");
-  database.Execute(
-      "CREATE TABLE access(id INTEGER PRIMARY KEY, uid INTEGER NOT NULL, gid INTEGER NOT NULL, mode INTEGER NOT NULL,"
-      " acl TEXT NOT NULL)");
-  database.Execute("CREATE UNIQUE INDEX access_record ON access(uid, gid, mode, acl)");
+  for (const char* sql : kAccessTables) database.Execute(sql);
   for (const char* table : {"docs", "folders"}) {
     const std::string has =
         "SELECT count(*) FROM pragma_table_info('" + std::string(table) + "') WHERE name = 'access'";
@@ -136,8 +84,13 @@ void AddAccess(Database& database) {
   database.Execute("COMMIT");
 }
 
-/// The format, 2 or more.
+/// The format, kOldestFormat or more. A file that is refused is closed as it was opened: what its log holds stays
+/// there.
 int64_t CheckFormat(Database& database) {
+  const auto empty_log_when_closed = [&database](bool whether) {
+    (void)sqlite3_db_config(database.Handle(), SQLITE_DBCONFIG_NO_CKPT_ON_CLOSE, whether ? 0 : 1, nullptr);
+  };
+  empty_log_when_closed(false);
   const bool ours = database.QueryInt("PRAGMA application_id") == kApplicationId;
   FERROX_FAIL_IF(
       !ours, Error::kEngineStorage,
@@ -147,16 +100,37 @@ int64_t CheckFormat(Database& database) {
                  "index file " + database.Path() + ": it has format " + std::to_string(version) +
                      ", this engine reads formats up to " + std::to_string(kStoreFormat) +
                      "; use the engine that wrote it, or 'fileindexctl rebuild', which makes it anew");
-  FERROX_FAIL_IF(version < 2, Error::kEngineStorage,
+  FERROX_FAIL_IF(version < kOldestFormat, Error::kEngineStorage,
                  "index file " + database.Path() + ": it has format " + std::to_string(version) +
                      ", which is too old; 'fileindexctl rebuild' makes it anew");
+  empty_log_when_closed(true);
   return version;
 }
 
 }  // namespace
 
-void PrepareStore(Database& database, bool create, const Schema& schema) {
+bool NeedsUpgrade(const std::string& path) {
+  Database database(path, Database::Mode::kRead);
+  return CheckFormat(database) < kStoreFormat;
+}
+
+void MakeStoreTables(Database& database) {
+  database.Execute("PRAGMA application_id = " + std::to_string(kApplicationId));
+  database.Execute("PRAGMA user_version = " + std::to_string(kStoreFormat));
+  for (const char* sql : kDocumentTables) database.Execute(sql);
+  for (const char* sql : kAccessTables) database.Execute(sql);
+  for (const char* sql : kTables) database.Execute(sql);
+}
+
+void MakeStoreIndexes(Database& database) {
+  for (const char* sql : kDocumentIndexes) database.Execute(sql);
+}
+
+void PrepareStore(Database& database, bool create) {
   database.Execute("PRAGMA page_size = 8192");
+  const bool is_new = create && database.QueryInt("SELECT count(*) FROM sqlite_master") == 0;
+  FERROX_FAIL_IF(!is_new && CheckFormat(database) < kStoreFormat, Error::kEngineStorage,
+                 "index file " + database.Path() + ": it has an older format, and is yet to be upgraded");
   database.Execute("PRAGMA cache_size = -8192");  // below 0: KiB
   // Readers see the last commit, and wait for no writer, while changes go to the write-ahead log. FULL: a commit is on
   // the disk when it returns.
@@ -165,9 +139,11 @@ void PrepareStore(Database& database, bool create, const Schema& schema) {
   database.Execute("PRAGMA wal_autocheckpoint = 1000");  // pages
   database.Execute("PRAGMA journal_size_limit = 8388608");
   RegisterFullText(database);
-  if (create && database.QueryInt("SELECT count(*) FROM sqlite_master") == 0) MakeTables(database);
-  if (CheckFormat(database) == 2) UpgradeFrom2(database, schema);
-  AddAccess(database);
+  if (!is_new) return AddAccess(database);
+  database.Execute("BEGIN IMMEDIATE");
+  MakeStoreTables(database);
+  MakeStoreIndexes(database);
+  database.Execute("COMMIT");
 }
 
 }  // namespace ferrox::engine

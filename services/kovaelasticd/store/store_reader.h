@@ -9,12 +9,14 @@
 #include "services/kovaelasticd/store/document.h"
 #include "services/kovaelasticd/store/folder_tree.h"
 #include "services/kovaelasticd/store/hidden_documents.h"
+#include "services/kovaelasticd/store/older_format.h"
 #include "services/kovaelasticd/store/sqlite_db.h"
 #include "services/kovaelasticd/store/text_codec.h"
 
 namespace ferrox::engine {
 
-/// A connection that only reads, with what is needed to understand its rows. For one thread at a time.
+/// A connection that only reads, also a file of an older format, with what is needed to understand its rows. For one
+/// thread at a time.
 struct StoreReader {
   /// `hidden_documents`, of the same file, must outlive this.
   StoreReader(const std::string& path, HiddenDocuments& hidden_documents);
@@ -23,7 +25,7 @@ struct StoreReader {
 
   Database database;
   FieldNames names;
-  FolderTree tree{database};
+  FolderTree tree{database, PrepareOlderFormat(database)};
   TextCodec codec;
   /// Documents that are deleted but still in the tables; null when there are none.
   std::shared_ptr<const DocSet> hidden;
