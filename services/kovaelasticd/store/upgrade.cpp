@@ -157,7 +157,7 @@ class Upgrader {
     Statement rows = to_.Prepare(rows_sql);
     Statement body = to_.Prepare("SELECT zstd FROM old.bodies WHERE id = ?1");
     while (rows.Step()) {
-      const StoredDocument stored = ReadRow(rows, tree_);
+      const StoredDocument stored = ReadRow(rows, tree_.PathOf(rows.Int(1)));
       std::string text;
       if (stored.text_bytes > 0 && body.Bind(1, stored.id).Step()) text = codec.Unpack(body.Text(0));
       body.Reset();
