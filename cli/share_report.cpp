@@ -68,6 +68,10 @@ void PrintIndex(const Json::Value& share) {
                  IntOf(share, "last_commit") == 0 ? "no change since the daemon started"
                                                   : ("last change " + Date(IntOf(share, "last_commit"))).c_str());
   }
+  if (UintOf(index, "clearing") != 0) {
+    (void)printf("    %s documents of deleted folders are still to be cleared from its file; no search finds them\n",
+                 Count(UintOf(index, "clearing")).c_str());
+  }
   if (index["rebuilding"].isObject()) {
     (void)printf("    being rebuilt since %s, because %s; searches find what is indexed by now\n",
                  Date(IntOf(index["rebuilding"], "since")).c_str(),

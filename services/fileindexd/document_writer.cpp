@@ -116,8 +116,8 @@ void DocumentWriter::RemoveBelow(const std::string& folder, const Interruption& 
 }
 
 void DocumentWriter::RemoveTree(const std::string& path, const Interruption& interruption) {
-  Remove(path);
-  RemoveBelow(path, interruption);
+  interruption.Check();
+  Remove(std::vector<std::string>{path}, true);
 }
 
 void DocumentWriter::Commit() {

@@ -39,10 +39,9 @@ class DocumentWriter {
   void Remove(const std::string& path) { Remove(std::vector<std::string>{path}, false); }
   /// The documents at the paths, and, with `and_below`, all below them, in one request.
   void Remove(const std::vector<std::string>& paths, bool and_below);
-  /// All documents below a folder, a thousand at a time: the index can remove all at once, but not be interrupted then.
-  /// @throws Interrupted.
+  /// All documents below a path, a thousand at a time. @throws Interrupted.
   void RemoveBelow(const std::string& folder, const Interruption& interruption);
-  /// The same with the document at the path.
+  /// The document at the path and all below it, at once. @throws Interrupted.
   void RemoveTree(const std::string& path, const Interruption& interruption);
 
   /// Makes all that was done durable, by whichever thread. @throws Error.

@@ -30,8 +30,8 @@ class MoveStage {
   /// Returns when all that was begun is done. @throws Interrupted; Error.
   void Finish();
 
-  /// Whether a folder was moved with all below it.
-  bool MovedFolder() const { return mover_.MovedFolder(); }
+  /// Whether a folder was moved or removed with all below it.
+  bool ChangedFolder() const { return mover_.MovedFolder() || removed_folder_; }
 
   /// Moves the documents of folders among `differing`, those whose configuration has changed, that are indexed under
   /// another name now, as a user's renamed home is.
@@ -49,6 +49,8 @@ class MoveStage {
   PathsUnderWay under_way_;
   TaskGroup tasks_;
   RemovalBatch gone_trees_;
+  int removed_ = 0;              ///< paths
+  bool removed_folder_ = false;  ///< there were documents below one of these
 };
 
 }  // namespace ferrox::indexd

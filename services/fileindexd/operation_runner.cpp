@@ -45,8 +45,9 @@ void OperationRunner::Run(const std::function<void(const TakeOperation&)>& each,
   moves_.Finish();
   moves_.MoveRenamedFolders(also_compare);
   const bool moved_strays = context_.may_hold_strays && moves_.MoveStrays();
-  // To compare a folder with the disk takes as long as it is large; it is found under its new name before that.
-  if (moves_.MovedFolder()) commits_.Commit();
+  // To compare a folder with the disk takes as long as it is large. Before that, what was in a folder is found under
+  // its new name, or no longer.
+  if (moves_.ChangedFolder()) commits_.Commit();
 
   follower_.Start();
   each([this](const fileindex::OP& op) {
