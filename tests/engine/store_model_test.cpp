@@ -6,6 +6,7 @@
 #include <gtest/gtest.h>
 
 #include "base/path.h"
+#include "services/kovaelasticd/search/path_condition.h"
 #include "services/kovaelasticd/store/access_records.h"
 #include "services/kovaelasticd/store/fts.h"
 #include "tests/engine/store_helpers.h"
@@ -131,6 +132,36 @@ class StoreModel {
             << path.substr(0, end + 1);
       }
     }
+  }
+
+  /// The same by the places in memory, which follow each commit; and that they are those of the rows.
+  void CheckPlaces() {
+    std::unique_ptr<StoreReader> reader = readers_.Borrow();
+    reader->database.Execute("BEGIN");
+    reader->Refresh();
+    const int64_t version = LoadTotals(reader->database).version;
+    const std::shared_ptr<const Places> places = reader->places.Load(reader->database, version);
+    std::string folder = Path();
+    if (folder.find("//") != folder.npos || folder.back() == '/') folder = "/a";
+    DocSet all, found;
+    Statement rows = reader->database.Prepare("SELECT id, folder, access FROM docs");
+    while (rows.Step()) {
+      const Place place = places->Documents().At(static_cast<size_t>(rows.Int(0)));
+      ASSERT_TRUE(place.folder == rows.Int(1) && place.access == rows.Int(2)) << rows.Int(0);
+      all.Add(rows.Int(0));
+    }
+    if (reader->hidden != nullptr) all.Subtract(*reader->hidden);
+    int64_t expected = 0;
+    for (const auto& [path, file] : committed_) expected += base::IsAtOrBelow(path, folder) ? 1 : 0;
+    PathCondition condition(*reader, version, folder);
+    found = all;
+    condition.Apply(found, true);
+    ASSERT_EQ(expected, found.Count()) << folder;
+    condition.Apply(all, false);
+    ASSERT_EQ(std::ssize(committed_), found.Count() + all.Count());
+    reader->database.Execute("COMMIT");
+    if (random_() % 5 == 0) reader->places.GiveBack(std::chrono::steady_clock::now() + PlacesCache::kIdle);
+    readers_.Return(std::move(reader));
   }
 
   /// What is left in the file once all is cleared, beside that of an index of the same documents.
@@ -290,6 +321,7 @@ class StoreModel {
   test::TempDir folder_;
   Json::Value mappings_;
   std::unique_ptr<IndexStore> store_;
+  ReaderPool readers_{folder_ / "index.sqlite"};
   std::map<std::string, File> files_;
   std::map<std::string, File> committed_;
   std::map<std::string, std::string> folders_;  ///< records that folders were given, by path with "/"
@@ -308,6 +340,7 @@ TEST(StoreModelTest, AnySequenceOfChangesLeavesTheDocumentsOfTheModel) {
       if (i % 10 != 0) continue;
       ASSERT_NO_FATAL_FAILURE(model.CheckSearch()) << "step " << i;
       ASSERT_NO_FATAL_FAILURE(model.CheckFolders()) << "step " << i;
+      ASSERT_NO_FATAL_FAILURE(model.CheckPlaces()) << "step " << i;
     }
     model.CheckWords();
   }

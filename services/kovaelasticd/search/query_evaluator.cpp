@@ -4,10 +4,9 @@
 #include <cmath>
 #include <string_view>
 
-#include "base/path.h"
 #include "fileindex/util.h"
+#include "services/kovaelasticd/search/path_condition.h"
 #include "services/kovaelasticd/store/document.h"
-#include "services/kovaelasticd/store/older_format.h"
 #include "services/kovaelasticd/store/store_rows.h"
 #include "services/kovaelasticd/text/words.h"
 
@@ -134,7 +133,7 @@ DocSet QueryEvaluator::EvaluateFilter(const QueryNode& node) {
     statement.Bind(1, int64_t{KindOfExtension(node.text)}).Bind(2, int64_t{kFolder});
     collect(statement.Bind(3, std::string_view(node.text)));
   } else if (node.type == QueryNode::Type::kPath) {
-    found = DocumentsAt(node.text);
+    found = PathCondition(reader_, totals_.version, node.text).AllDocuments();
   } else if (node.type == QueryNode::Type::kRange) {
     Statement statement = database.Prepare("SELECT doc FROM temp.meta_terms WHERE term >= ?1 AND term <= ?2");
     for (const std::string& name : node.fields) {
@@ -152,62 +151,23 @@ DocSet QueryEvaluator::EvaluateFilter(const QueryNode& node) {
   return found;
 }
 
-/// The document at `path`, and all in its folder and those below. Of a small part of the tree each folder's documents
-/// are listed; beyond that one walk over the list of all documents by folder is cheaper.
-DocSet QueryEvaluator::DocumentsAt(const std::string& path) {
-  constexpr size_t kFoldersListed = 1000;
-  if (tree_.IsFlat()) return DocumentsAtWholePath(database_, path);
-  DocSet found;
-  const std::optional<StoredDocument> itself = FindDocument(database_, tree_, path);
-  if (itself.has_value()) found.Add(itself->id);
-  std::vector<int64_t> folders;
-  DocSet is_below;  // of folders' numbers
-  const auto add = [&](int64_t folder) {
-    folders.push_back(folder);
-    is_below.Add(folder);
-  };
-  const int64_t top = tree_.Find(path == "/" ? path : path + "/");
-  if (top == FolderTree::kNone) return found;
-  add(top);
-  Statement below = database_.Prepare("SELECT id FROM folders WHERE parent = ?1");
-  for (size_t i = 0; i < folders.size(); ++i) {
-    for (below.Bind(1, folders[i]); below.Step();) add(below.Int(0));
-    below.Reset();
-  }
-  if (folders.size() > kFoldersListed) {
-    Statement all = database_.Prepare("SELECT folder, id FROM docs INDEXED BY docs_place");
-    while (all.Step()) {
-      if (is_below.Contains(all.Int(0))) found.Add(all.Int(1));
-    }
-    return found;
-  }
-  Statement documents = database_.Prepare("SELECT id FROM docs WHERE folder = ?1");
-  for (const int64_t folder : folders) {
-    for (documents.Bind(1, folder); documents.Step();) found.Add(documents.Int(0));
-    documents.Reset();
-  }
-  return found;
-}
-
 /// Keeps the documents for which the condition holds (`wanted`) or does not. Few documents are checked one by one, by
 /// their rows; for many, the set of all that match is cheaper. A range has no column: its words are in meta_fts.
 void QueryEvaluator::ApplyFilter(DocSet& documents, const QueryNode& filter, bool wanted) {
+  if (filter.type == QueryNode::Type::kPath) {
+    return PathCondition(reader_, totals_.version, filter.text).Apply(documents, wanted);
+  }
   if (documents.Count() > kCheckOneByOneMax || filter.type == QueryNode::Type::kRange) {
     const DocSet matching = EvaluateFilter(filter);
     wanted ? documents.IntersectWith(matching) : documents.Subtract(matching);
     return;
   }
-  std::vector<int64_t> failing;
-  documents.ForEach([&](int64_t id) {
-    if (MatchesFilter(id, filter) != wanted) failing.push_back(id);
-    return true;
-  });
-  for (const int64_t id : failing) documents.Remove(id);
+  documents.RemoveIf([&](int64_t id) { return MatchesFilter(id, filter) != wanted; });
 }
 
 /// The same condition for one document, by its row.
 bool QueryEvaluator::MatchesFilter(int64_t id, const QueryNode& filter) {
-  Statement statement = database_.Prepare("SELECT kind, ext, size, mtime, folder, leaf FROM docs WHERE id = ?1");
+  Statement statement = database_.Prepare("SELECT kind, ext, size, mtime FROM docs WHERE id = ?1");
   statement.Bind(1, id);
   if (!statement.Step()) return false;
   const auto in_range = [&](int column) {
@@ -221,10 +181,8 @@ bool QueryEvaluator::MatchesFilter(int64_t id, const QueryNode& filter) {
       return statement.Text(1) == filter.text;
     case QueryNode::Type::kSize:
       return in_range(2);
-    case QueryNode::Type::kDate:
-      return in_range(3);
     default:
-      return base::IsAtOrBelow(tree_.PathOf(statement.Int(4)) + std::string(statement.Text(5)), filter.text);
+      return in_range(3);
   }
 }
 
@@ -264,7 +222,7 @@ DocSet QueryEvaluator::EvaluateWords(const QueryNode& node, bool ranking) {
   found.UniteWith(meta.Set());
   if (ranking) {
     RankedWord term;
-    term.weight = std::log(1.0 + static_cast<double>(documents_) / static_cast<double>(1 + found.Count()));
+    term.weight = std::log(1.0 + static_cast<double>(totals_.documents) / static_cast<double>(1 + found.Count()));
     term.content = content.TakeHits();
     term.meta = meta.TakeHits();
     found_words_.ranked.push_back(std::move(term));

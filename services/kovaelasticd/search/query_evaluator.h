@@ -6,9 +6,9 @@
 
 #include "services/kovaelasticd/query/query.h"
 #include "services/kovaelasticd/store/doc_set.h"
-#include "services/kovaelasticd/store/folder_tree.h"
 #include "services/kovaelasticd/store/fts.h"
-#include "services/kovaelasticd/store/sqlite_db.h"
+#include "services/kovaelasticd/store/store_reader.h"
+#include "services/kovaelasticd/store/store_rows.h"
 #include "services/kovaelasticd/text/snippet.h"
 
 namespace ferrox::engine {
@@ -31,10 +31,14 @@ struct FoundWords {
 /// that conditions are joined by bit operations. For one query and one snapshot.
 class QueryEvaluator {
  public:
-  /// `documents`: how many the index has. `hits_max`: of how many documents, those added last, each word's hits are
-  /// kept for ranking; the sets are complete in any case. `hidden`, which may be null, are never found.
-  QueryEvaluator(Database& database, FolderTree& tree, int64_t documents, size_t hits_max, const DocSet* hidden)
-      : database_(database), tree_(tree), documents_(documents), hits_max_(hits_max), hidden_(hidden) {}
+  /// `totals` are the snapshot's. `hits_max`: of how many documents, those added last, each word's hits are kept for
+  /// ranking; the sets are complete in any case. What the reader hides is never found.
+  QueryEvaluator(StoreReader& reader, const Totals& totals, size_t hits_max)
+      : reader_(reader),
+        database_(reader.database),
+        totals_(totals),
+        hits_max_(hits_max),
+        hidden_(reader.hidden.get()) {}
 
   /// @throws Error kEngineStorage.
   DocSet Evaluate(const QueryNode& query) { return Evaluate(query, true); }
@@ -48,14 +52,13 @@ class QueryEvaluator {
   DocSet EvaluateWords(const QueryNode& node, bool ranking);
   DocSet EvaluateFilter(const QueryNode& node);
   DocSet AllDocuments();
-  DocSet DocumentsAt(const std::string& path);
   void ApplyFilter(DocSet& documents, const QueryNode& filter, bool wanted);
   bool MatchesFilter(int64_t id, const QueryNode& filter);
   void CollectWords(const QueryNode& node, HitCollector& content, HitCollector& meta);
 
+  StoreReader& reader_;
   Database& database_;
-  FolderTree& tree_;
-  const int64_t documents_;
+  const Totals totals_;
   const size_t hits_max_;
   const DocSet* const hidden_;
   FoundWords found_words_;

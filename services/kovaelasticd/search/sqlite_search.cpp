@@ -108,7 +108,7 @@ SearchHit Searcher::LoadHit(const RankedDocument& ranked, const FoundWords& word
 
 SearchReply Searcher::Run() {
   const Totals totals = LoadTotals(reader_.database);
-  QueryEvaluator evaluator(reader_.database, reader_.tree, totals.documents, request_.ranked_max, reader_.hidden.get());
+  QueryEvaluator evaluator(reader_, totals, request_.ranked_max);
   const DocSet documents = evaluator.Evaluate(*request_.query);
   SearchReply reply;
   reply.total = documents.Count();

@@ -37,6 +37,15 @@ class DocSet {
     const size_t common = words_.size() < other.words_.size() ? words_.size() : other.words_.size();
     for (size_t i = 0; i < common; ++i) words_[i] &= ~other.words_[i];
   }
+  /// Removes the numbers for which `condition` is true.
+  template <typename Condition>
+  void RemoveIf(Condition&& condition) {
+    for (size_t i = 0; i < words_.size(); ++i) {
+      for (uint64_t left = words_[i]; left != 0; left &= left - 1) {
+        if (condition(static_cast<int64_t>(i * 64) + __builtin_ctzll(left))) words_[i] &= ~(left & -left);
+      }
+    }
+  }
   /// Counts the bits: not to be called in a loop.
   int64_t Count() const {
     int64_t count = 0;

@@ -96,6 +96,15 @@ std::vector<int64_t> FolderTree::ChildrenOf(int64_t folder, const std::string& b
   return children;
 }
 
+bool FolderTree::IsAtOrBelow(int64_t folder, int64_t other) {
+  constexpr int kDepthMax = 1 << 15;  // deeper than any path; only a damaged file has a circle
+  for (int depth = 0; depth < kDepthMax && folder > kNone; ++depth) {
+    if (folder == other) return true;
+    folder = NodeOf(folder).parent;
+  }
+  return false;
+}
+
 void FolderTree::Move(int64_t folder, std::string_view new_path) {
   const std::string_view above = FolderOf(new_path.substr(0, new_path.size() - 1));
   const int64_t parent = Make(above);

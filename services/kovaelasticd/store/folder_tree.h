@@ -48,6 +48,8 @@ class FolderTree {
   std::vector<int64_t> AtAndBelow(int64_t folder);
   /// The folders in `folder` whose names begin with `begin`; all for "".
   std::vector<int64_t> ChildrenOf(int64_t folder, const std::string& begin);
+  /// Whether a folder is `other`, or lies below it.
+  bool IsAtOrBelow(int64_t folder, int64_t other);
   /// Gives a folder, with all below it, the path `new_path`, which no folder has and which does not lie below it.
   /// Prunes where it was.
   void Move(int64_t folder, std::string_view new_path);

@@ -3,17 +3,13 @@
 #include <algorithm>
 
 #include "common/json_util.h"
+#include "services/kovaelasticd/store/packed_numbers.h"
 
 namespace ferrox::engine {
 
 namespace {
 
 using Tag = PackedFields::Tag;
-
-void PutNumber(std::string& out, uint64_t value) {
-  for (; value >= 0x80; value >>= 7) out += static_cast<char>(value | 0x80);
-  out += static_cast<char>(value);
-}
 
 void PutText(std::string& out, Tag tag, const std::string& text) {
   out += static_cast<char>(tag);
@@ -28,8 +24,7 @@ void PutValue(std::string& out, const Json::Value& value) {
     out += static_cast<char>(value.asBool() ? Tag::kTrue : Tag::kFalse);
   } else if (value.isInt64() && value.type() != Json::realValue) {
     out += static_cast<char>(Tag::kInt);
-    const int64_t number = value.asInt64();
-    PutNumber(out, (static_cast<uint64_t>(number) << 1) ^ static_cast<uint64_t>(number >> 63));
+    PutSigned(out, value.asInt64());
   } else if (value.isString()) {
     PutText(out, Tag::kText, value.asString());
   } else {
@@ -64,12 +59,10 @@ std::optional<std::string_view> TextField(std::string_view packed, int64_t numbe
 }
 
 uint64_t PackedFields::ReadNumber() {
+  std::string_view rest = packed_.substr(at_);
   uint64_t value = 0;
-  for (int shift = 0; at_ < packed_.size() && shift < 64; shift += 7) {
-    const auto byte = static_cast<unsigned char>(packed_[at_++]);
-    value |= static_cast<uint64_t>(byte & 0x7F) << shift;
-    if (byte < 0x80) break;
-  }
+  (void)CutNumber(rest, value);
+  at_ = packed_.size() - rest.size();
   return value;
 }
 
@@ -81,8 +74,7 @@ bool PackedFields::Next() {
   if (at_ >= packed_.size()) return true;
   tag_ = static_cast<Tag>(packed_[at_++]);
   if (tag_ == Tag::kInt) {
-    const uint64_t coded = ReadNumber();
-    int_ = static_cast<int64_t>(coded >> 1) ^ -static_cast<int64_t>(coded & 1);
+    int_ = Unzigzag(ReadNumber());
   } else if (tag_ == Tag::kText || tag_ == Tag::kJson) {
     const uint64_t size = ReadNumber();
     text_ = packed_.substr(at_, static_cast<size_t>(std::min<uint64_t>(size, packed_.size() - at_)));

@@ -28,6 +28,8 @@ SqliteStore::SqliteStore(const std::string& path, bool create, std::shared_ptr<c
     : schema_(std::move(schema)), writer_(path, OpeningMode(path, create)), readers_(path) {
   PrepareStore(writer_, create);
   links_.MakeTables();
+  places_.MakeTable();
+  places_.Forget();  // what an upgrade has changed is in there
   LoadFieldNames(writer_, names_);
   totals_ = LoadTotals(writer_);
   clearing_.Load();
@@ -39,6 +41,7 @@ SqliteStore::~SqliteStore() = default;
 
 void SqliteStore::OnRow(RowWatch::Table table, int64_t number, bool is_update) {
   listed_.OnRow(table, number, is_update);
+  places_.OnRow(table, number);
 }
 
 void SqliteStore::Begin() {
@@ -50,6 +53,7 @@ void SqliteStore::Begin() {
 void SqliteStore::Commit() {
   if (!in_transaction_) return;
   texts_.Flush();
+  places_.Flush(++totals_.version);
   SaveTotals(writer_, totals_);
   writer_.Execute("COMMIT");
   in_transaction_ = false;
@@ -77,6 +81,7 @@ void SqliteStore::Rollback() {
   access_.Forget();
   listed_.Forget();
   clearing_.Forget();
+  places_.Forget();
   names_ = FieldNames();
   LoadFieldNames(writer_, names_);
   totals_ = LoadTotals(writer_);

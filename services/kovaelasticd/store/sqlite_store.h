@@ -11,6 +11,7 @@
 #include "services/kovaelasticd/store/folder_tree.h"
 #include "services/kovaelasticd/store/index_store.h"
 #include "services/kovaelasticd/store/listed_documents.h"
+#include "services/kovaelasticd/store/place_writer.h"
 #include "services/kovaelasticd/store/row_watch.h"
 #include "services/kovaelasticd/store/sqlite_db.h"
 #include "services/kovaelasticd/store/store_reader.h"
@@ -81,6 +82,7 @@ class SqliteStore : public IndexStore {
   AccessRecords access_{writer_};
   FileLinks links_{writer_, tree_, names_};
   ListedDocuments listed_{writer_, tree_};
+  PlaceWriter places_{writer_};
   RowWatch watch_{writer_, [this](auto table, int64_t number, bool is_update) { OnRow(table, number, is_update); }};
   TextWriter texts_{writer_, names_, schema_};
   Totals totals_;  ///< with the changes of the open transaction

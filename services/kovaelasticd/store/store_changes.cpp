@@ -39,6 +39,7 @@ void SqliteStore::CountText(int64_t before, int64_t after) {
 void SqliteStore::Changed(int64_t bytes) {
   uncommitted_bytes_ += bytes + kRowBytes;
   texts_.Changed(bytes);
+  if (places_.IsFull()) places_.Flush(totals_.version + 1);
 }
 
 int64_t SqliteStore::InsertRow(const DocRow& row, int64_t text_bytes) {

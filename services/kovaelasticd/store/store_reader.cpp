@@ -12,8 +12,8 @@ constexpr size_t kIdleMax = 4;
 
 }  // namespace
 
-StoreReader::StoreReader(const std::string& path, HiddenDocuments& hidden_documents)
-    : database(path, Database::Mode::kRead), hidden_documents_(hidden_documents) {
+StoreReader::StoreReader(const std::string& path, HiddenDocuments& hidden_documents, PlacesCache& shared_places)
+    : database(path, Database::Mode::kRead), places(shared_places), hidden_documents_(hidden_documents) {
   database.Execute("PRAGMA cache_size = -8192");
   RegisterFullText(database);
   database.Execute("CREATE VIRTUAL TABLE temp.meta_terms USING fts5vocab('main', 'meta_fts', 'instance')");
@@ -39,7 +39,7 @@ std::unique_ptr<StoreReader> ReaderPool::Borrow() {
       return reader;
     }
   }
-  return std::make_unique<StoreReader>(path_, hidden_documents_);
+  return std::make_unique<StoreReader>(path_, hidden_documents_, places_);
 }
 
 void ReaderPool::Return(std::unique_ptr<StoreReader> reader) {

@@ -10,6 +10,7 @@
 #include "services/kovaelasticd/store/folder_tree.h"
 #include "services/kovaelasticd/store/hidden_documents.h"
 #include "services/kovaelasticd/store/older_format.h"
+#include "services/kovaelasticd/store/places_cache.h"
 #include "services/kovaelasticd/store/sqlite_db.h"
 #include "services/kovaelasticd/store/text_codec.h"
 
@@ -18,8 +19,8 @@ namespace ferrox::engine {
 /// A connection that only reads, also a file of an older format, with what is needed to understand its rows. For one
 /// thread at a time.
 struct StoreReader {
-  /// `hidden_documents`, of the same file, must outlive this.
-  StoreReader(const std::string& path, HiddenDocuments& hidden_documents);
+  /// What is shared with other readers, of the same file, must outlive this.
+  StoreReader(const std::string& path, HiddenDocuments& hidden_documents, PlacesCache& shared_places);
   /// To be called at the beginning of each transaction: learns what was committed since the last one.
   void Refresh();
 
@@ -29,6 +30,7 @@ struct StoreReader {
   TextCodec codec;
   /// Documents that are deleted but still in the tables; null when there are none.
   std::shared_ptr<const DocSet> hidden;
+  PlacesCache& places;  ///< of all readers of the index
 
  private:
   HiddenDocuments& hidden_documents_;
@@ -46,10 +48,12 @@ class ReaderPool {
   std::unique_ptr<StoreReader> Borrow();
   /// Takes a connection back that has no transaction open. After a failure do not return it: it is closed then.
   void Return(std::unique_ptr<StoreReader> reader);
+  PlacesCache& SharedPlaces() { return places_; }
 
  private:
   const std::string path_;
   HiddenDocuments hidden_documents_;
+  PlacesCache places_;
   base::Mutex mutex_;
   std::vector<std::unique_ptr<StoreReader>> idle_ BASE_GUARDED_BY(mutex_);
 };

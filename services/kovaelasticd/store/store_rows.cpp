@@ -73,6 +73,7 @@ Totals LoadTotals(Database& database) {
     if (key == "documents") totals.documents = statement.Int(1);
     if (key == "with_content") totals.with_content = statement.Int(1);
     if (key == "text_bytes") totals.text_bytes = statement.Int(1);
+    if (key == "version") totals.version = statement.Int(1);
     if (key == "without_access") without_access = statement.Int(1);
     if (key == "clearing") totals.clearing = statement.Int(1);
   }
@@ -81,11 +82,10 @@ Totals LoadTotals(Database& database) {
 }
 
 void SaveTotals(Database& database, const Totals& totals) {
-  const std::pair<std::string_view, int64_t> values[] = {{"documents", totals.documents},
-                                                         {"with_content", totals.with_content},
-                                                         {"text_bytes", totals.text_bytes},
-                                                         {"without_access", totals.without_access},
-                                                         {"clearing", totals.clearing}};
+  const std::pair<std::string_view, int64_t> values[] = {
+      {"documents", totals.documents},   {"with_content", totals.with_content},
+      {"text_bytes", totals.text_bytes}, {"without_access", totals.without_access},
+      {"version", totals.version},       {"clearing", totals.clearing}};
   Statement statement = database.Prepare("INSERT OR REPLACE INTO info(key, value) VALUES(?1, ?2)");
   for (const auto& [key, value] : values) statement.Bind(1, key).Bind(2, value).Run();
 }

@@ -17,6 +17,7 @@
 #include "services/kovaelasticd/store/folder_tree.h"
 #include "services/kovaelasticd/store/fts.h"
 #include "services/kovaelasticd/store/index_files.h"
+#include "services/kovaelasticd/store/place_writer.h"
 #include "services/kovaelasticd/store/sqlite_db.h"
 #include "services/kovaelasticd/store/store_format.h"
 #include "services/kovaelasticd/store/store_rows.h"
@@ -88,6 +89,7 @@ class Upgrader {
     if (cut_words) CutWords();
     MakeStoreIndexes(to_);
     to_.Execute("COMMIT");
+    PlaceWriter(to_).MakeTable();
   }
 
  private:

@@ -1,0 +1,84 @@
+#include "services/kovaelasticd/search/path_condition.h"
+
+#include "services/kovaelasticd/store/older_format.h"
+#include "services/kovaelasticd/store/places.h"
+#include "services/kovaelasticd/store/store_rows.h"
+
+namespace ferrox::engine {
+
+namespace {
+
+/// Up to so many documents are looked at by their rows, and so many folders are listed, at some microseconds each.
+constexpr int64_t kOneByOneMax = 200;
+constexpr size_t kFoldersListedMax = 200;
+
+}  // namespace
+
+PathCondition::PathCondition(StoreReader& reader, int64_t version, const std::string& path)
+    : reader_(reader), version_(version), path_(path), folder_(reader.tree.Find(path == "/" ? path : path + "/")) {
+  const std::optional<StoredDocument> itself = FindDocument(reader_.database, reader_.tree, path);
+  if (itself.has_value()) itself_ = itself->id;
+}
+
+std::optional<std::vector<int64_t>> PathCondition::FewFolders() {
+  std::vector<int64_t> folders;
+  if (folder_ != FolderTree::kNone) folders.push_back(folder_);
+  Statement below = reader_.database.Prepare("SELECT id FROM folders WHERE parent = ?1");
+  for (size_t i = 0; i < folders.size(); ++i) {
+    for (below.Bind(1, folders[i]); below.Step();) {
+      if (folders.size() == kFoldersListedMax) return std::nullopt;
+      folders.push_back(below.Int(0));
+    }
+    below.Reset();
+  }
+  return folders;
+}
+
+DocSet PathCondition::DocumentsIn(const std::vector<int64_t>& folders) {
+  DocSet found;
+  if (itself_ >= 0) found.Add(itself_);
+  Statement documents = reader_.database.Prepare("SELECT id FROM docs WHERE folder = ?1");
+  for (const int64_t folder : folders) {
+    for (documents.Bind(1, folder); documents.Step();) found.Add(documents.Int(0));
+    documents.Reset();
+  }
+  return found;
+}
+
+DocSet PathCondition::AllDocuments() {
+  if (reader_.tree.IsFlat()) return DocumentsAtWholePath(reader_.database, path_);
+  if (const auto folders = FewFolders(); folders.has_value()) return DocumentsIn(*folders);
+  const std::shared_ptr<const Places> places = reader_.places.Load(reader_.database, version_);
+  FoldersBelow below(*places, folder_);
+  DocSet found;
+  const auto end = static_cast<int64_t>(places->Documents().End());
+  for (int64_t id = 0; id < end; ++id) {
+    if (below.Contains(places->Documents().At(static_cast<size_t>(id)).folder)) found.Add(id);
+  }
+  if (itself_ >= 0) found.Add(itself_);
+  return found;
+}
+
+void PathCondition::Apply(DocSet& documents, bool wanted) {
+  const auto combine = [&](const DocSet& found) {
+    wanted ? documents.IntersectWith(found) : documents.Subtract(found);
+  };
+  const auto keep = [&](const auto& holds) {
+    documents.RemoveIf([&](int64_t id) { return (id == itself_ || holds(id)) != wanted; });
+  };
+  if (reader_.tree.IsFlat()) return combine(DocumentsAtWholePath(reader_.database, path_));
+  if (!reader_.places.IsLoaded()) {
+    if (documents.Count() <= kOneByOneMax) return keep([this](int64_t id) { return HoldsByRow(id); });
+    if (const auto folders = FewFolders(); folders.has_value()) return combine(DocumentsIn(*folders));
+  }
+  const std::shared_ptr<const Places> places = reader_.places.Load(reader_.database, version_);
+  FoldersBelow below(*places, folder_);
+  keep([&](int64_t id) { return below.Contains(places->Documents().At(static_cast<size_t>(id)).folder); });
+}
+
+bool PathCondition::HoldsByRow(int64_t id) {
+  Statement row = reader_.database.Prepare("SELECT folder FROM docs WHERE id = ?1");
+  return row.Bind(1, id).Step() && reader_.tree.IsAtOrBelow(row.Int(0), folder_);
+}
+
+}  // namespace ferrox::engine

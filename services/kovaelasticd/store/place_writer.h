@@ -1,0 +1,50 @@
+#pragma once
+
+#include <cstdint>
+#include <vector>
+
+#include "services/kovaelasticd/store/places.h"
+#include "services/kovaelasticd/store/row_watch.h"
+#include "services/kovaelasticd/store/sqlite_db.h"
+
+namespace ferrox::engine {
+
+/// Keeps the table "places", which repeats where documents and folders lie and whose access they have: their rows are
+/// too many, and each too long, to be read for that. A row of it has PlaceList::kPart places, and the version of the
+/// commit that changed it last. For the thread that writes, within its transaction; members that read or write throw
+/// Error kEngineStorage.
+class PlaceWriter {
+ public:
+  /// `database` must outlive this.
+  explicit PlaceWriter(Database& database) : database_(database) {}
+
+  /// Makes the table where it is missing, from all rows.
+  void MakeTable();
+  /// To be called with each row that changes.
+  void OnRow(RowWatch::Table table, int64_t number);
+  /// Whether so much has changed that Flush should not wait for the commit.
+  bool IsFull() const { return documents_.size() + folders_.size() >= kChangedMax; }
+  /// Brings the table up to date; `version` is that of the next commit.
+  void Flush(int64_t version);
+  /// Drops the changes, which were rolled back.
+  void Forget();
+
+ private:
+  static constexpr size_t kChangedMax = 20000;
+  /// The list of documents or that of folders.
+  struct List {
+    int64_t parity;  ///< of its parts' numbers in the table
+    const char* one;
+    const char* range;
+  };
+  static const List kDocuments, kFolders;
+
+  void FlushList(const List& list, std::vector<int64_t>& changed, int64_t version);
+  void UpdatePart(const List& list, int64_t number, const int64_t* begin, const int64_t* end, int64_t version);
+
+  Database& database_;
+  std::vector<int64_t> documents_;  ///< that have changed
+  std::vector<int64_t> folders_;
+};
+
+}  // namespace ferrox::engine
