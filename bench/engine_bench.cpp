@@ -1,7 +1,8 @@
 // What the search engine costs: generated text (words drawn by Zipf's law from 60,000, seed fixed) in 20,000 documents
 // of 0.5 to 60 KB unless told otherwise, sent as requests to the engine inside this process, without a socket. Measured
-// are building, the size of the index, one change with its commit, 50 ranked queries, 20 hits with snippets each, the
-// rename of a folder with a quarter of the documents, and its deletion, beside that of as many documents one by one.
+// are building, the size of the index, one change with its commit, 50 ranked queries, 20 hits with snippets each, a
+// change of the rights of many files, the rename of a folder with a quarter of the documents, and its deletion, beside
+// that of as many documents one by one.
 //   engine_bench [--documents N] [--text BYTES] [--folder DIR]      BYTES: the size of each text
 #include <sys/resource.h>
 
@@ -22,6 +23,7 @@
 
 #include "common/json_util.h"
 #include "services/kovaelasticd/commands/engine.h"
+#include "wire/engine_requests.h"
 
 namespace {
 
@@ -90,10 +92,14 @@ class Bench {
       : folder_(folder), documents_(documents), text_bytes_(text_bytes), engine_(folder) {}
 
   void Run() {
-    Call("index_create", [this](Json::Value& data) { data["path"] = folder_ + "/index"; });
+    Call("index_create", [this](Json::Value& data) {
+      data["path"] = folder_ + "/index";
+      data["mappings"]["properties"]["KOVAMDAttributeChangeDate"]["type"] = "int";  // as in file indices
+    });
     Build();
     MeasureUpsert();
     MeasureQueries();
+    MeasureAccess();
     MeasureRename();
     MeasureDelete();
     printf("peak memory            %ld MB\n", PeakMemoryMb());
@@ -123,6 +129,12 @@ class Bench {
            std::to_string(number) + (number % 3 == 0 ? ".txt" : ".html");
   }
 
+  /// As of a file whose rights have changed so many times.
+  static std::string StampOf(size_t number, size_t changes) {
+    const int64_t changed = 1500000000123456789 + static_cast<int64_t>(changes) * 1000000000;
+    return "4096.1500000000123456789." + std::to_string(changed) + "." + std::to_string(number + 1);
+  }
+
   void Upsert(size_t number, const std::string& text) {
     const std::string path = PathOf(number);
     Call("document_upsert_by_id", [&](Json::Value& data) {
@@ -138,6 +150,10 @@ class Bench {
       document["KOVAMDFSSize"] = Json::Int64(text.size());
       document["KOVAMDFSContentChangeDate"] = Json::Int64(1500000000 + number * 7919 % 200000000);
       document["KOVAMDOwnerUserID"] = "1000";
+      document["KOVAMDOwnerGroupID"] = "100";
+      document["KOVAMDAttributeChangeDate"] = 1500000000;
+      document["_KOVAStamp"] = StampOf(number, 0);
+      document["_KOVAAccess"] = "1000:100:0644";
       document["KOVAMDTextContent"] = text;
     });
   }
@@ -213,6 +229,36 @@ class Bench {
 
   /// How many documents are renamed, and deleted.
   size_t MovedCount() const { return documents_ / 4; }
+
+  /// A chmod of many files: one by one, as a compound, and as one command.
+  void MeasureAccess() {
+    const size_t count = std::min<size_t>(documents_, 10000);
+    const auto measure = [&](const char* name, const Json::Value& request) {
+      const std::string text = ferrox::toString(request);
+      const double cpu = CpuSec();
+      (void)engine_.Handle(text, {});
+      const double answered = CpuSec();
+      Call("commit");
+      printf("%-22s %.1f us of CPU a document, %.1f with the commit\n", name, (answered - cpu) * 1e6 / double(count),
+             (CpuSec() - cpu) * 1e6 / double(count));
+    };
+    Json::Value compound;
+    for (size_t number = 0; number < count; ++number) {
+      Json::Value& part = compound["compound"].append(Json::Value(Json::objectValue));
+      part["command"] = "document_set_by_id";
+      part["data"]["id"] = kId;
+      part["data"]["doc_id"] = PathOf(number);
+      part["data"]["data"]["_KOVAStamp"] = StampOf(number, 1);
+      part["data"]["data"]["_KOVAAccess"] = "1000:100:0640";
+      part["data"]["data"]["KOVAMDAttributeChangeDate"] = 1500000001;
+    }
+    measure("rights one by one", compound);
+    std::vector<ferrox::wire::SeenAccess> records;
+    for (size_t number = 0; number < count; ++number) {
+      records.push_back({PathOf(number), StampOf(number, 2), "1000:100:0600"});
+    }
+    measure("rights at once", ferrox::wire::AccessSetRequest(kId, records));
+  }
 
   void MeasureRename() {
     const size_t count = MovedCount();
