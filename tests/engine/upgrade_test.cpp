@@ -116,6 +116,27 @@ TEST_F(UpgradeTest, AFileOfFormat2AnswersAsBeforeWhetherItsWordsAreTakenOverOrCu
   }
 }
 
+TEST_F(UpgradeTest, AFileFromBeforeAccessRecordsTakesThem) {
+  const std::string file = folder_ / "3.sqlite";
+  {
+    SqliteStore store(file, true, NoPaths());
+    store.Upsert("/v/a", FileDocument("/v/a"));
+    store.Commit();
+  }
+  {
+    Database database(file, Database::Mode::kWrite);
+    for (const char* table : {"docs", "folders"})
+      database.Execute("ALTER TABLE " + std::string(table) + " DROP COLUMN access");
+    database.Execute("DROP TABLE access; DELETE FROM info WHERE key = 'without_access'");
+  }
+  for (const int64_t without : {1, 0}) {
+    SqliteStore store(file, false, NoPaths());
+    EXPECT_EQ(store.Stat().without_access, without);
+    EXPECT_EQ(store.SetAccess({{"/v/a", "1.1.1.1", "0:0:0644"}}).differing.size(), 1U) << "it has no stamp";
+    store.Commit();
+  }
+}
+
 TEST_F(UpgradeTest, SearchesGoOnAndChangesWaitWhileAKillOrAFailureLeavesTheOldFile) {
   std::counting_semaphore<1000> turns(0);
   std::atomic<int> reached{0};
