@@ -56,6 +56,18 @@ void PrintWork(const Json::Value& share) {
   (void)printf("\n");
 }
 
+/// How far the engine is with a newer format of the index's file, or why that waits.
+void PrintUpgrading(const Json::Value& upgrading) {
+  const std::string problem = TextOf(upgrading, "problem");
+  if (!problem.empty()) {
+    (void)printf("    not upgraded yet: %s; searches go on\n", EscapeOneLine(problem).c_str());
+    return;
+  }
+  const uint64_t done = UintOf(upgrading, "done"), of = UintOf(upgrading, "of");
+  (void)printf("    being upgraded: %d%%, %s of %s documents; searches go on, changes are indexed afterwards\n",
+               of == 0 ? 0 : static_cast<int>(done * 100 / of), Count(done).c_str(), Count(of).c_str());
+}
+
 /// What the engine has of the share; nothing where it has none.
 void PrintIndex(const Json::Value& share) {
   const Json::Value& index = share["index"];
@@ -77,6 +89,7 @@ void PrintIndex(const Json::Value& share) {
                  Date(IntOf(index["rebuilding"], "since")).c_str(),
                  EscapeOneLine(TextOf(index["rebuilding"], "reason")).c_str());
   }
+  if (index["upgrading"].isObject()) PrintUpgrading(index["upgrading"]);
 }
 
 /// How many changes wait, and how long the oldest has waited.

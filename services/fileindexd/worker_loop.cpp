@@ -5,6 +5,7 @@
 #include <exception>
 
 #include "common/log.h"
+#include "common/subject_error.h"
 #include "services/support/settings_problem.h"
 
 namespace ferrox::indexd {
@@ -16,6 +17,12 @@ using std::chrono::steady_clock;
 
 /// Rounds while an event is expected.
 constexpr milliseconds kEventPoll(200);
+
+/// How far an upgrade is, the engine alone can tell: its own words, without what the library puts before them.
+std::string WordsOf(const Error& error) {
+  const Subject subject = SubjectError::Of(error);
+  return subject.kind == Subject::kEngineRefusal ? subject.name : error.what();
+}
 
 }  // namespace
 
@@ -83,7 +90,9 @@ milliseconds WorkerLoop::OnFailure(const Error& error) {
   const Retry retry =
       retry_.OnError({error.Code(), availability_.IsOutOfSpace(error), availability_.WasAway()}, steady_clock::now());
   const bool is_other = retry.problem == Problem::kOther;
-  const std::string reason = is_other ? services::Describe(error) : error.what();
+  const std::string reason = is_other                                    ? services::Describe(error)
+                             : retry.problem == Problem::kIndexUpgrading ? WordsOf(error)
+                                                                         : error.what();
   if (is_other && retry.is_first) Log(LOG_ERR, "share %s: %s", context_.share.c_str(), reason.c_str());
   Report(retry, reason);
   if (retry.problem == Problem::kNoSpace) availability_.OnOutOfSpace(error);
