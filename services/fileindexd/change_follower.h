@@ -1,16 +1,14 @@
 #pragma once
 
 #include <chrono>
-#include <exception>
 #include <set>
 #include <string>
-#include <thread>
 
-#include "base/mutex.h"
 #include "services/fileindexd/document_writer.h"
 #include "services/fileindexd/interruption.h"
 #include "services/fileindexd/path_rules.h"
 #include "services/fileindexd/queue_tail.h"
+#include "services/fileindexd/repeating_thread.h"
 #include "services/fileindexd/task_pool.h"
 
 namespace ferrox::indexd {
@@ -34,21 +32,16 @@ class ChangeFollower {
 
   /// All that `context` refers to outlives the follower. Does nothing before Start.
   explicit ChangeFollower(const Context& context);
-  ChangeFollower(const ChangeFollower&) = delete;
-  ChangeFollower& operator=(const ChangeFollower&) = delete;
-  ~ChangeFollower() { Stop(); }
 
   void Start();
   /// Blocks until the writes that have begun are done. May be called again, and without a Start.
-  void Stop();
+  void Stop() { thread_.Stop(); }
   /// @throws what ended the follower's thread: then a write, its own or one that it committed, may be missing.
-  void ThrowIfFailed();
+  void ThrowIfFailed() { thread_.ThrowIfFailed(); }
   /// The files that it wrote. Only after Stop.
   const std::set<std::string>& EarlyWrites() const { return early_writes_; }
 
  private:
-  void Follow();
-  bool WaitForNextRead(std::chrono::steady_clock::duration last_took);
   void WriteChangedFiles();
 
   const Context context_;
@@ -56,11 +49,7 @@ class ChangeFollower {
   TaskGroup tasks_;
   QueueTail tail_;
   std::set<std::string> early_writes_;  ///< the thread's, until it has ended
-  base::Mutex mutex_;
-  base::ConditionVariable stop_changed_;
-  bool stopping_ BASE_GUARDED_BY(mutex_) = false;
-  std::exception_ptr failure_ BASE_GUARDED_BY(mutex_);
-  std::thread thread_;
+  RepeatingThread thread_;
 };
 
 }  // namespace ferrox::indexd

@@ -34,7 +34,8 @@ DiskStage::DiskStage(const PassContext& context, PathRules& rules, DocumentWrite
       writer_(writer),
       commits_(commits),
       tasks_(context.share.environment.pool, context.share.interruption),
-      comparer_(context, rules, writer, commits, tasks_) {}
+      access_(tasks_, writer),
+      comparer_(context, rules, writer, commits, tasks_, access_) {}
 
 void DiskStage::CarryOut(fileindex::FileIndexOP op, const std::string& path, const std::string& old_path) {
   for (const Handler& handler : kHandlers) {
@@ -58,14 +59,16 @@ void DiskStage::Upsert(const std::string& path, const std::string&) {
 }
 
 void DiskStage::Attr(const std::string& path, const std::string&) {
+  writer_.WillChange();  // so that the commit records the folders that have no documents: one of them may be meant
   if (path == context_.share.root) return;
   const Place place = rules_.PlaceOf(path);
+  struct stat status = {};
   if (place == Place::kOutside) {
     tasks_.Submit([this, path] { writer_.Remove(path); });
-  } else if (BecameReadable(path)) {
+  } else if (PresenceOf(path, status) == Presence::kThere && BecameReadable(path, status)) {
     comparer_.Compare(path);
   } else if (place == Place::kIndexed) {
-    tasks_.Submit([this, path] { writer_.RefreshAttributes(path); });
+    access_.Add(path);
   }
 }
 
@@ -100,7 +103,8 @@ void DiskStage::FullReindex(const std::string&, const std::string&) {
 
 /// Whether this is a folder that can be read and of which the index knows no content: its permissions may just have
 /// been opened.
-bool DiskStage::BecameReadable(const std::string& folder) const {
+bool DiskStage::BecameReadable(const std::string& folder, const struct stat& status) const {
+  if (!S_ISDIR(status.st_mode)) return false;
   const base::UniqueFd opened(open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
   return opened.Valid() && context_.index.List(folder, "", 1).empty();
 }
@@ -115,7 +119,7 @@ void DiskStage::RecheckEarlyWrites(const std::set<std::string>& early_writes) {
 }
 
 void DiskStage::RefreshLinked() {
-  LinkedDocuments linked(context_, writer_, commits_, tasks_);
+  LinkedDocuments linked(context_, writer_, commits_, access_);
   linked.RefreshChangedFiles();
   linked.RefreshSuspects();
 }

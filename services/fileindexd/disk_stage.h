@@ -1,9 +1,12 @@
 #pragma once
 
+#include <sys/stat.h>
+
 #include <set>
 #include <string>
 
 #include "fileindex/optree/optree.h"
+#include "services/fileindexd/access_batch.h"
 #include "services/fileindexd/document_writer.h"
 #include "services/fileindexd/pass_commits.h"
 #include "services/fileindexd/pass_context.h"
@@ -28,7 +31,7 @@ class DiskStage {
   /// Compares what is at and below the path, unless that was done in this pass (TreeComparer).
   void CompareOnce(const std::string& path) { comparer_.CompareOnce(path); }
   /// Returns when all that was begun is done. @throws Interrupted; Error.
-  void Wait() { tasks_.Wait(); }
+  void Wait() { access_.Finish(); }
 
   /// Removes the documents of those files that an earlier pass wrote early and that are gone: folding drops the delete
   /// of a file where the folder that it was in is a file now, since nothing in that folder could have been indexed, if
@@ -51,7 +54,7 @@ class DiskStage {
   void Rename(const std::string& path, const std::string& old_path);
   void Reindex(const std::string& path, const std::string& old_path);
   void FullReindex(const std::string& path, const std::string& old_path);
-  bool BecameReadable(const std::string& folder) const;
+  bool BecameReadable(const std::string& folder, const struct stat& status) const;
 
   const PassContext& context_;
   PathRules& rules_;
@@ -59,6 +62,7 @@ class DiskStage {
   PassCommits& commits_;
   bool had_reindex_ = false;
   TaskGroup tasks_;
+  AccessBatch access_;
   TreeComparer comparer_;
 };
 

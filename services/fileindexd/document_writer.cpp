@@ -10,6 +10,7 @@
 
 namespace ferrox::indexd {
 
+using KOVA::CONTENT_EXTRACT::Access;
 using KOVA::CONTENT_EXTRACT::ExtractVersion;
 using KOVA::CONTENT_EXTRACT::SameContent;
 using KOVA::CONTENT_EXTRACT::Stamp;
@@ -39,8 +40,16 @@ bool DocumentWriter::WantsContent(const std::string& path, const struct stat& st
 }
 
 bool DocumentWriter::IsCurrent(const IndexedEntry& indexed, const struct stat& status) const {
-  return indexed.stamp == Stamp(status) && indexed.with_content == WantsContent(indexed.path, status) &&
-         !indexed.cut_without_reason && !IsWorthAnotherTry(indexed);
+  return indexed.stamp == Stamp(status) && indexed.has_access && HoldsContentAsWanted(indexed, status);
+}
+
+bool DocumentWriter::LacksAccessAlone(const IndexedEntry& indexed, const struct stat& status) const {
+  return SameContent(indexed.stamp, Stamp(status)) && HoldsContentAsWanted(indexed, status);
+}
+
+bool DocumentWriter::HoldsContentAsWanted(const IndexedEntry& indexed, const struct stat& status) const {
+  return indexed.with_content == WantsContent(indexed.path, status) && !indexed.cut_without_reason &&
+         !IsWorthAnotherTry(indexed);
 }
 
 void DocumentWriter::Write(const std::string& path) {
@@ -49,9 +58,11 @@ void DocumentWriter::Write(const std::string& path) {
   try {
     WillChange();
     const bool with_content = WantsContent(path, status);
+    const std::string access = Access(path, status);
     if (with_content) status_.FileRead();
     index_.Upsert(path, with_content);
-    status_.DocumentWritten();
+    status_.DocumentsWritten();
+    RecordChangedSince(status, access, path);
   } catch (const Error& error) {
     RecordFailure(error, path);
   }
@@ -67,7 +78,7 @@ void DocumentWriter::RefreshAttributes(const std::string& path) {
   try {
     WillChange();
     index_.Attr(path);
-    status_.DocumentWritten();
+    status_.DocumentsWritten();
   } catch (const Error& error) {
     if (error.Code() == Error::kEngineNoSuchDocument) return Write(path);
     return RecordFailure(error, path);
@@ -75,7 +86,20 @@ void DocumentWriter::RefreshAttributes(const std::string& path) {
   // Written to meanwhile, the document would have the stamp of the new content beside the text of the old.
   struct stat now = {};
   const bool still = PresenceOf(path, now) == Presence::kThere && SameContent(Stamp(now), Stamp(status));
-  if (!still) Write(path);
+  if (!still) return Write(path);
+  if (!SameRights(status, now)) (void)RecordAccess({path});
+}
+
+/// What else changed meanwhile has an event of its own that is to come.
+void DocumentWriter::RecordChangedSince(const struct stat& before, const std::string& access, const std::string& path) {
+  struct stat now = {};
+  if (PresenceOf(path, now) != Presence::kThere) return;
+  if (!SameRights(before, now) || Access(path, now) != access) (void)RecordAccess({path});
+}
+
+std::set<std::string> DocumentWriter::RecordAccess(const std::vector<std::string>& paths) {
+  WillChange();
+  return access_.Record(paths);
 }
 
 void DocumentWriter::RefreshRenamed(const std::string& path, const std::string& old_path) {

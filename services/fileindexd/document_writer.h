@@ -3,10 +3,12 @@
 #include <sys/stat.h>
 
 #include <atomic>
+#include <set>
 #include <string>
 #include <vector>
 
 #include "common/error.h"
+#include "services/fileindexd/access_recorder.h"
 #include "services/fileindexd/interruption.h"
 #include "services/fileindexd/share_folders.h"
 #include "services/fileindexd/share_index.h"
@@ -21,15 +23,22 @@ class DocumentWriter {
  public:
   /// All outlive it.
   DocumentWriter(ShareIndex& index, const ShareFolders& folders, ShareStatus& status)
-      : index_(index), folders_(folders), status_(status) {}
+      : index_(index), folders_(folders), status_(status), access_(index, status) {}
 
-  /// Whether the document needs no writing: it has the stamp of the file's present state, and holds its content exactly
-  /// when that is wanted and as well as the present readers can read it.
+  /// Whether the document needs nothing: it has the stamp of the file's present state and a record of its rights, and
+  /// holds its content exactly when that is wanted and as well as the present readers can read it.
   bool IsCurrent(const IndexedEntry& indexed, const struct stat& status) const;
+  /// Whether nothing is wrong with the document but its rights and what comes with these, so that RecordAccess makes it
+  /// current.
+  bool LacksAccessAlone(const IndexedEntry& indexed, const struct stat& status) const;
 
-  /// Writes the whole document of what is at the path, or removes it when there is nothing.
+  /// Writes the whole document of what is at the path, or removes it when there is nothing. Rights that change
+  /// meanwhile are recorded, although their event may have come before there was a document.
   void Write(const std::string& path);
-  /// The same, but leaves the content alone, so that the file is not read, when that cannot make an old content look
+  /// Records the rights that files and folders have now, and reads nothing else of them (AccessRecorder). Paths of
+  /// which more has to be refreshed are returned: RefreshAttributes does it.
+  std::set<std::string> RecordAccess(const std::vector<std::string>& paths);
+  /// As Write, but leaves the content alone, so that the file is not read, when that cannot make an old content look
   /// like a new one.
   void RefreshAttributes(const std::string& path);
   /// The same after a rename, which changes the moved entry itself and, with another extension, the way in which its
@@ -51,12 +60,15 @@ class DocumentWriter {
   void WillChange() { uncommitted_ = true; }
 
  private:
+  bool HoldsContentAsWanted(const IndexedEntry& indexed, const struct stat& status) const;
   bool WantsContent(const std::string& path, const struct stat& status) const;
+  void RecordChangedSince(const struct stat& before, const std::string& access, const std::string& path);
   void RecordFailure(const Error& error, const std::string& path);
 
   ShareIndex& index_;
   const ShareFolders& folders_;
   ShareStatus& status_;
+  AccessRecorder access_;
   std::atomic<bool> uncommitted_{false};
 };
 

@@ -4,6 +4,9 @@
 
 #include <syslog.h>
 
+#include <cinttypes>
+#include <cstdint>
+
 #include "common/error.h"
 #include "common/lock_file.h"
 #include "common/log.h"
@@ -23,7 +26,18 @@ void IndexKeeper::EnsureExists(bool may_create) {
     CreateMissing();
   }
   if (index_->List("", "", 1).empty()) context_.applied.Forget();
+  CompareUnlessAccessIsRecorded();
   exists_ = true;
+}
+
+/// An index of before rights were recorded is compared once; no file is read for that.
+void IndexKeeper::CompareUnlessAccessIsRecorded() {
+  if (access_is_recorded_) return;
+  const uint64_t without = index_->WithoutAccess();
+  access_is_recorded_ = without == 0 || context_.queue.Add(fileindex::EVENT_REINDEX, context_.root);
+  if (without == 0) return;
+  Log(LOG_NOTICE, "%" PRIu64 " documents of share %s do not say who may read their files; they are compared", without,
+      context_.share.c_str());
 }
 
 /// The folders are loaded under their lock, so that no index is made for a share whose last folder is being removed. A

@@ -54,10 +54,12 @@ class IndexKeeper {
 
  private:
   void CreateMissing();
+  void CompareUnlessAccessIsRecorded();
 
   ShareContext& context_;
   const std::unique_ptr<ShareIndex> index_;
   bool exists_ = false;
+  bool access_is_recorded_ = false;  ///< or a comparison that does it is queued
   bool has_no_strays_ = false;
   std::atomic<bool> check_requested_{true};
   std::atomic<int64_t> rebuilding_{0};  ///< the one under way, as ShareIndex tells it; 0: none

@@ -41,10 +41,9 @@ void LinkedDocuments::RefreshPages(const ListPage& list, const std::function<boo
     context_.share.interruption.Check();
     const std::vector<IndexedEntry> page = list(after, kPage);
     for (const IndexedEntry& entry : page) {
-      if (skip(entry)) continue;
-      tasks_.Submit([&writer = writer_, path = entry.path] { writer.RefreshAttributes(path); });
+      if (!skip(entry)) access_.Add(entry.path);
     }
-    tasks_.Wait();
+    access_.Finish();
     commits_.CommitIfDue();
     found = page.size();
     if (found > 0) after = page.back().path;

@@ -4,10 +4,10 @@
 #include <string>
 #include <vector>
 
+#include "services/fileindexd/access_batch.h"
 #include "services/fileindexd/document_writer.h"
 #include "services/fileindexd/pass_commits.h"
 #include "services/fileindexd/pass_context.h"
-#include "services/fileindexd/task_pool.h"
 
 namespace ferrox::indexd {
 
@@ -16,8 +16,8 @@ namespace ferrox::indexd {
 class LinkedDocuments {
  public:
   /// All outlive it.
-  LinkedDocuments(const PassContext& context, DocumentWriter& writer, PassCommits& commits, TaskGroup& tasks)
-      : context_(context), writer_(writer), commits_(commits), tasks_(tasks) {}
+  LinkedDocuments(const PassContext& context, DocumentWriter& writer, PassCommits& commits, AccessBatch& access)
+      : context_(context), writer_(writer), commits_(commits), access_(access) {}
 
   /// Of files that changed under a name outside of the share, or one that is gone: the queue has only their inode
   /// numbers, and the index finds the documents. @throws Interrupted; Error.
@@ -35,7 +35,7 @@ class LinkedDocuments {
   const PassContext& context_;
   DocumentWriter& writer_;
   PassCommits& commits_;
-  TaskGroup& tasks_;
+  AccessBatch& access_;
 };
 
 }  // namespace ferrox::indexd

@@ -24,14 +24,17 @@ OperationRunner::OperationRunner(const PassContext& context)
       rules_(context.share.share, context.share.root, context.folders),
       writer_(context.index, context.folders, context.share.status),
       early_writes_before_(context.early_writes),
-      follower_({context.share.share, context.share.root, context.folders, context.share.queue.Path(), writer_,
-                 context.share.environment.pool, context.share.interruption,
-                 context.share.environment.early_write_interval}),
-      commits_(writer_, follower_),
+      anchors_(context.share.root, context.folders, writer_),
+      changes_({context.share.share, context.share.root, context.folders, context.share.queue.Path(), writer_,
+                context.share.environment.pool, context.share.interruption,
+                context.share.environment.early_write_interval}),
+      access_({context.share.root, context.share.queue.Path(), context.index, writer_, anchors_,
+               context.share.interruption, context.share.environment.early_write_interval}),
+      commits_(writer_, anchors_, changes_, access_),
       moves_(context_, rules_, writer_),
       disk_(context_, rules_, writer_, commits_) {}
 
-OperationRunner::~OperationRunner() { StopFollower(); }
+OperationRunner::~OperationRunner() { StopFollowers(); }
 
 void OperationRunner::Run(const std::function<void(const TakeOperation&)>& each,
                           const std::vector<std::string>& also_compare) {
@@ -41,6 +44,7 @@ void OperationRunner::Run(const std::function<void(const TakeOperation&)>& each,
   moves_.SetUrgent(operations <= kUrgentOperations);
   disk_.SetUrgent(operations <= kUrgentOperations);
 
+  access_.Start();
   each([this](const fileindex::OP& op) { CarryOut(op, Stage::kMove); });
   moves_.Finish();
   moves_.MoveRenamedFolders(also_compare);
@@ -49,7 +53,7 @@ void OperationRunner::Run(const std::function<void(const TakeOperation&)>& each,
   // its new name, or no longer.
   if (moves_.ChangedFolder()) commits_.Commit();
 
-  follower_.Start();
+  changes_.Start();
   each([this](const fileindex::OP& op) {
     CarryOut(op, Stage::kDisk);
     context_.share.status.OperationDone();
@@ -57,10 +61,11 @@ void OperationRunner::Run(const std::function<void(const TakeOperation&)>& each,
   for (const std::string& path : also_compare) disk_.CompareOnce(path);
   if (moved_strays) disk_.CompareOnce(context_.share.root);
   disk_.Wait();
-  StopFollower();
-  follower_.ThrowIfFailed();
+  StopFollowers();
+  changes_.ThrowIfFailed();
+  access_.ThrowIfFailed();
   disk_.RecheckEarlyWrites(early_writes_before_);
-  context_.early_writes = follower_.EarlyWrites();
+  context_.early_writes = changes_.EarlyWrites();
   disk_.RefreshLinked();
   commits_.Commit();
 }
@@ -105,9 +110,10 @@ void OperationRunner::KeepWhatIsDone() noexcept {
   }
 }
 
-void OperationRunner::StopFollower() {
-  follower_.Stop();
-  context_.early_writes.insert(follower_.EarlyWrites().begin(), follower_.EarlyWrites().end());
+void OperationRunner::StopFollowers() {
+  access_.Stop();
+  changes_.Stop();
+  context_.early_writes.insert(changes_.EarlyWrites().begin(), changes_.EarlyWrites().end());
 }
 
 }  // namespace ferrox::indexd

@@ -6,6 +6,8 @@
 #include <vector>
 
 #include "fileindex/optree/optree.h"
+#include "services/fileindexd/access_follower.h"
+#include "services/fileindexd/anchors.h"
 #include "services/fileindexd/change_follower.h"
 #include "services/fileindexd/disk_stage.h"
 #include "services/fileindexd/document_writer.h"
@@ -48,13 +50,15 @@ class OperationRunner {
 
   void CarryOut(const fileindex::OP& op, Stage stage);
   void AwaitOwner(const std::string& path, const std::string& old_path) const;
-  void StopFollower();
+  void StopFollowers();
 
   PassContext context_;
   PathRules rules_;
   DocumentWriter writer_;
   const std::set<std::string> early_writes_before_;  ///< those of the pass before
-  ChangeFollower follower_;
+  Anchors anchors_;
+  ChangeFollower changes_;
+  AccessFollower access_;
   PassCommits commits_;
   MoveStage moves_;
   DiskStage disk_;

@@ -4,6 +4,7 @@
 #include <unistd.h>
 
 #include <functional>
+#include <string_view>
 #include <utility>
 
 #include <json/value.h>
@@ -20,12 +21,23 @@ namespace {
 /// More than the longest line.
 constexpr size_t kChunkBytes = 512 * 1024;
 constexpr size_t kFilesAtOnce = 500;
+/// How such lines of the notification daemon begin (fileindex::AppendChangeLine).
+constexpr std::string_view kAttributesLineBegin = "{\"event\":4,";
+constexpr std::string_view kWriteLineBegin = "{\"event\":2,";
 
 void TakeChangedFile(const std::string& line, std::set<std::string>& files) {
   try {
     const fileindex::Event event(line);
     const bool changed = event.event == fileindex::EVENT_CREATE || event.event == fileindex::EVENT_MODIFY;
     if (changed && !event.is_dir) files.insert(event.path);
+  } catch (const Error&) {
+    // Logged when the queue's turn comes.
+  }
+}
+
+void TakePath(const std::string& line, std::set<std::string>& paths) {
+  try {
+    paths.insert(fileindex::Event(line).path);
   } catch (const Error&) {
     // Logged when the queue's turn comes.
   }
@@ -69,6 +81,16 @@ std::vector<std::string> QueueTail::NextChangedFiles() {
     return files.size() < kFilesAtOnce;
   });
   return {files.begin(), files.end()};
+}
+
+AttributeChanges QueueTail::NextAttributeChanges() {
+  AttributeChanges changes;
+  read_ = ReadQueueLines(path_, read_, [&changes](const std::string& line) {
+    if (line.starts_with(fileindex::kFilesLineBegin)) TakeNumbers(line, changes.files);
+    if (line.starts_with(kAttributesLineBegin) || line.starts_with(kWriteLineBegin)) TakePath(line, changes.paths);
+    return true;
+  });
+  return changes;
 }
 
 std::set<uint64_t> ChangedNumbersIn(const std::string& queue_path) {

@@ -10,6 +10,12 @@
 
 namespace ferrox::indexd {
 
+/// Files and folders whose attributes changed.
+struct AttributeChanges {
+  std::set<std::string> paths;
+  std::set<uint64_t> files;  ///< inode numbers; of these the names are not known
+};
+
 /// Reads the lines that are appended to a live queue, without taking them. Belongs to one thread; the queue must not be
 /// detached while it lives.
 class QueueTail {
@@ -19,6 +25,9 @@ class QueueTail {
   /// The files that lines appended since the last call call new or changed, each once; of very many the first, the
   /// others come with the next call. Lines that say anything else are passed over.
   std::vector<std::string> NextChangedFiles();
+  /// What such lines, in the form in which the notification daemon writes them, call changed but not new: also what was
+  /// written to, since one line stands for all that happened to a file. Of very many lines the first, as above.
+  AttributeChanges NextAttributeChanges();
 
  private:
   std::string path_;

@@ -5,11 +5,11 @@
 
 namespace ferrox::indexd {
 
-void Rate::Count(int64_t now_ms) {
+void Rate::Count(int64_t now_ms, uint64_t count) {
   const int64_t second = now_ms / 1000;
   Bucket& bucket = buckets_[static_cast<size_t>(second % kSeconds)];
   if (bucket.second != second) bucket = {second, 0};
-  ++bucket.count;
+  bucket.count += count;
 }
 
 double Rate::PerSecond(int64_t now_ms) const {

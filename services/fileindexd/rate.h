@@ -8,7 +8,7 @@ namespace ferrox::indexd {
 /// How many a second there were, over the last ten seconds. Times are of a clock that does not jump, in milliseconds.
 class Rate {
  public:
-  void Count(int64_t now_ms);
+  void Count(int64_t now_ms, uint64_t count);
   /// Averaged from the first of those seconds in which something was counted on, so that the rate of work that has
   /// just begun is not too low.
   double PerSecond(int64_t now_ms) const;

@@ -25,8 +25,18 @@ IndexedEntry ToEntry(const Json::Value& fields) {
   GetJsonValue(entry.content_type, fields, elastic::kKOVAMDContentType, false);
   GetJsonValue(entry.extract_version, fields, elastic::k_KOVAExtractVersion, false);
   entry.extract_failed = fields.isMember(elastic::k_KOVAExtractError);
+  entry.has_access = fields.isMember(elastic::k_KOVAAccess);
   entry.cut_without_reason = fields.isMember(elastic::k_KOVATextCut) && !entry.extract_failed;
   return entry;
+}
+
+std::vector<size_t> Positions(const Json::Value& list, size_t end) {
+  std::vector<size_t> positions;
+  for (const Json::Value& position : list) {
+    FERROX_FAIL_IF(!position.isUInt64() || position.asUInt64() >= end, Error::kBadEngineReply, toString(list));
+    positions.push_back(position.asUInt64());
+  }
+  return positions;
 }
 
 /// The engine channel only logs that a part of a compound request failed.
@@ -67,10 +77,8 @@ class Engine : public ShareIndex {
   }
 
   int64_t Rebuilding() override {
-    Json::Value reply;
-    elastic::SendRequest(reply, Request("index_stat"));
     long long since = 0;
-    GetJsonValue(since, reply["data"]["rebuilding"], "since", false);
+    GetJsonValue(since, Stat()["rebuilding"], "since", false);
     return since;
   }
 
@@ -79,6 +87,17 @@ class Engine : public ShareIndex {
   void Resume() override { elastic::ShareIndexResume(share_); }
   void Upsert(const std::string& path, bool need_meta) override { elastic::IndexUpsert(share_, path, need_meta); }
   void Attr(const std::string& path) override { elastic::IndexAttr(share_, path); }
+  AccessGaps SetAccess(const std::vector<wire::SeenAccess>& records) override {
+    Json::Value reply;
+    elastic::SendRequest(reply, wire::AccessSetRequest(id_, records));
+    const Json::Value& data = reply["data"];
+    FERROX_FAIL_IF(!data.isObject(), Error::kBadEngineReply, toString(reply));
+    return {Positions(data["differing"], records.size()), Positions(data["missing"], records.size())};
+  }
+  uint64_t WithoutAccess() override {
+    const Json::Value count = Stat()["without_access"];
+    return count.isUInt64() ? count.asUInt64() : 0;
+  }
   void Delete(const std::vector<std::string>& paths, bool and_below) override {
     if (paths.size() == 1) {
       elastic::IndexDel(share_, paths.front());
@@ -123,12 +142,17 @@ class Engine : public ShareIndex {
 
  private:
   Json::Value Request(const char* command) const { return wire::IndexRequest(command, id_); }
+  Json::Value Stat() const {
+    Json::Value reply;
+    elastic::SendRequest(reply, Request("index_stat"));
+    return reply["data"];
+  }
 
   std::vector<IndexedEntry> Query(const Json::Value& which, unsigned limit, const std::string& after) const {
     const wire::DocumentQuery query = {
         which,
         {elastic::kKOVAMDPath, elastic::k_KOVAStamp, elastic::k_KOVANeedMeta, elastic::kKOVAMDContentType,
-         elastic::k_KOVAExtractVersion, elastic::k_KOVAExtractError, elastic::k_KOVATextCut},
+         elastic::k_KOVAExtractVersion, elastic::k_KOVAExtractError, elastic::k_KOVATextCut, elastic::k_KOVAAccess},
         limit,
         after};
     Json::Value reply;

@@ -1,12 +1,15 @@
 #pragma once
 
 #include <chrono>
+#include <cstddef>
 #include <cstdint>
 #include <memory>
 #include <string>
 #include <vector>
 
 #include <json/value.h>
+
+#include "wire/engine_requests.h"
 
 namespace ferrox::indexd {
 
@@ -19,6 +22,13 @@ struct IndexedEntry {
   int extract_version = 0;          ///< of what read its content; 0: nothing did
   bool extract_failed = false;      ///< its content, or a part of it, could not be read
   bool cut_without_reason = false;  ///< its text was cut, and it has no failure that says so: an early version wrote it
+  bool has_access = true;           ///< it says who may read the file
+};
+
+/// Which of the records that were given to SetAccess are not all that is to be done, by their positions.
+struct AccessGaps {
+  std::vector<size_t> differing;  ///< the document is of another content than the file
+  std::vector<size_t> missing;    ///< there is no document
 };
 
 /// One share's index, as the daemon's work needs it. The one implementation asks the engine over its socket; tests have
@@ -44,6 +54,11 @@ class ShareIndex {
   virtual void Upsert(const std::string& path, bool need_meta) = 0;
   /// Replaces what name and lstat say of the file; leaves the content. @throws Error kEngineNoSuchDocument.
   virtual void Attr(const std::string& path) = 0;
+  /// Records the rights of files and folders, also of folders without a document. A document whose content is that of
+  /// the stamp gets the stamp, too. At most 10,000 records.
+  virtual AccessGaps SetAccess(const std::vector<wire::SeenAccess>& records) = 0;
+  /// How many documents have no record of rights: an earlier version wrote them, or another program.
+  virtual uint64_t WithoutAccess() = 0;
   /// Removes the documents at the paths, and, with `and_below`, all below them; in one request. Missing ones are no
   /// error.
   virtual void Delete(const std::vector<std::string>& paths, bool and_below) = 0;

@@ -75,10 +75,10 @@ void ShareStatus::SetEstimate(uint64_t files, bool complete) {
   comparison_.estimate_complete = complete;
 }
 
-void ShareStatus::DocumentWritten() {
+void ShareStatus::DocumentsWritten(uint64_t count) {
   const base::MutexLock lock(mutex_);
-  ++written_;
-  rate_.Count(SteadyMilliseconds());
+  written_ += count;
+  rate_.Count(SteadyMilliseconds(), count);
 }
 
 void ShareStatus::DocumentsDeleted(uint64_t count) {

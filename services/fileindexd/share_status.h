@@ -43,7 +43,7 @@ class ShareStatus {
   void FileExamined();
   void SetEstimate(uint64_t files, bool complete);
 
-  void DocumentWritten();
+  void DocumentsWritten(uint64_t count = 1);
   void FileRead() { ++files_read_; }
   uint64_t FilesRead() const { return files_read_; }
   void DocumentsDeleted(uint64_t count);

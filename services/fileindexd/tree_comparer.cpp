@@ -27,12 +27,13 @@ constexpr auto kTimeBeforeCount = std::chrono::milliseconds(300);
 }  // namespace
 
 TreeComparer::TreeComparer(const PassContext& context, PathRules& rules, DocumentWriter& writer, PassCommits& commits,
-                           TaskGroup& tasks)
+                           TaskGroup& tasks, AccessBatch& access)
     : context_(context),
       rules_(rules),
       writer_(writer),
       commits_(commits),
       tasks_(tasks),
+      access_(access),
       gone_(tasks, writer, false) {}
 
 void TreeComparer::CompareOnce(const std::string& path) {
@@ -80,7 +81,11 @@ void TreeComparer::CompareEntry(const std::string& path, Place place, const stru
   const auto indexed = context_.index.Find(path);
   if (place == Place::kOnTheWay) {
     if (!indexed.empty()) writer_.Remove(path);
-  } else if (indexed.empty() || !writer_.IsCurrent(indexed.front(), status)) {
+  } else if (!indexed.empty() && writer_.IsCurrent(indexed.front(), status)) {
+    return;
+  } else if (!indexed.empty() && writer_.LacksAccessAlone(indexed.front(), status)) {
+    access_.Add(path);
+  } else {
     tasks_.Submit([&writer = writer_, path] { writer.Write(path); });
   }
 }
@@ -104,7 +109,7 @@ void TreeComparer::CompareFolder(const std::string& folder) {
   context_.share.status.BeginComparison(folder);
   CompareBelow(folder, walk, context_.index, Actions(folder));
   gone_.Flush();
-  tasks_.Wait();
+  access_.Finish();
   context_.share.status.LinksSkipped(walk.LinksSkipped());
   context_.share.status.EndComparison();
 }
@@ -113,9 +118,11 @@ ComparisonActions TreeComparer::Actions(const std::string& folder) {
   ComparisonActions actions;
   ShareStatus& status = context_.share.status;
   actions.is_current = [this, &status](const IndexedEntry& indexed, const struct stat& file) {
-    const bool current = writer_.IsCurrent(indexed, file);
-    if (current) status.FileExamined();
-    return current;
+    const bool is_current = writer_.IsCurrent(indexed, file);
+    const bool lacks_access = !is_current && writer_.LacksAccessAlone(indexed, file);
+    if (lacks_access) access_.Add(indexed.path);
+    if (is_current || lacks_access) status.FileExamined();
+    return is_current || lacks_access;
   };
   actions.write = [this, &status](const std::string& path, const struct stat&) {
     tasks_.Submit([&writer = writer_, &status, path] {

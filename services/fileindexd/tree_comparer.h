@@ -5,6 +5,7 @@
 #include <string>
 
 #include "base/path_table.h"
+#include "services/fileindexd/access_batch.h"
 #include "services/fileindexd/comparison.h"
 #include "services/fileindexd/document_writer.h"
 #include "services/fileindexd/pass_commits.h"
@@ -16,13 +17,13 @@
 namespace ferrox::indexd {
 
 /// Brings the documents at and below a path in line with the disk: writes what is new or differs, and removes what is
-/// gone, not indexed, or lies outside of the share. Folders are walked in the caller's thread, files written by tasks;
-/// the figures go to the share's status. Belongs to the worker's thread.
+/// gone, not indexed, or lies outside of the share; where the rights alone differ, records these. Folders are walked in
+/// the caller's thread, files written by tasks; the figures go to the share's status. Belongs to the worker's thread.
 class TreeComparer {
  public:
-  /// All outlive it; `tasks` outlives it or ends its tasks afterwards: they do not use this object.
+  /// All outlive it; `tasks`, which are those of `access`, may end its tasks afterwards: they do not use this object.
   TreeComparer(const PassContext& context, PathRules& rules, DocumentWriter& writer, PassCommits& commits,
-               TaskGroup& tasks);
+               TaskGroup& tasks, AccessBatch& access);
 
   /// Compares what is at and below the path; nothing when it lies outside of the share. @throws Interrupted; Error.
   void Compare(const std::string& path);
@@ -42,6 +43,7 @@ class TreeComparer {
   DocumentWriter& writer_;
   PassCommits& commits_;
   TaskGroup& tasks_;
+  AccessBatch& access_;
   RemovalBatch gone_;
   base::PathTable<bool> compared_;
 };

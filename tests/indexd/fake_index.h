@@ -2,6 +2,7 @@
 
 #include <sys/stat.h>
 
+#include <algorithm>
 #include <atomic>
 #include <functional>
 #include <map>
@@ -25,6 +26,7 @@ class FakeIndex : public indexd::ShareIndex {
     std::string stamp;
     bool with_content = false;
     std::string content;  ///< what was read when it was last upserted
+    std::string access;
   };
 
   bool Exists() override {
@@ -44,7 +46,8 @@ class FakeIndex : public indexd::ShareIndex {
   void Resume() override { paused = false; }
   void Upsert(const std::string& path, bool need_meta) override {
     if (before_read) before_read(path);
-    const Document document = {StampOf(path), need_meta, need_meta ? ContentOf(path) : ""};
+    const Document document = {StampOf(path), need_meta, need_meta ? ContentOf(path) : "", AccessOf(path)};
+    if (after_read) after_read(path);
     const std::lock_guard lock(mutex);
     if (before_write) before_write(path);
     ++upserts[path];
@@ -59,6 +62,33 @@ class FakeIndex : public indexd::ShareIndex {
     (void)RequireDocument(path);
     Changed(path, stamp);
     documents[path].stamp = stamp;
+    documents[path].access = AccessOf(path);
+  }
+
+  indexd::AccessGaps SetAccess(const std::vector<wire::SeenAccess>& records) override {
+    const std::lock_guard lock(mutex);
+    indexd::AccessGaps gaps;
+    for (size_t i = 0; i < records.size(); ++i) {
+      const auto& [path, stamp, access] = records[i];
+      const auto found = documents.find(path);
+      (found == documents.end() ? folders[path] : found->second.access) = access;
+      if (found == documents.end()) {
+        gaps.missing.push_back(i);
+      } else if (!KOVA::CONTENT_EXTRACT::SameContent(found->second.stamp, stamp)) {
+        gaps.differing.push_back(i);
+      } else {
+        Changed(path, stamp);
+        found->second.stamp = stamp;
+      }
+    }
+    access_sets.insert(records.size());
+    if (after_access) after_access(records);
+    return gaps;
+  }
+  uint64_t WithoutAccess() override {
+    const std::lock_guard lock(mutex);
+    return static_cast<uint64_t>(
+        std::count_if(documents.begin(), documents.end(), [](const auto& item) { return item.second.access.empty(); }));
   }
 
   void Delete(const std::vector<std::string>& paths, bool and_below) override {
@@ -93,7 +123,7 @@ class FakeIndex : public indexd::ShareIndex {
     std::vector<indexd::IndexedEntry> page;
     for (auto at = documents.upper_bound(after.empty() ? folder + "/" : after);
          at != documents.end() && StringStartWith(at->first, folder + "/") && page.size() < limit; ++at) {
-      page.push_back({at->first, at->second.stamp, at->second.with_content});
+      page.push_back(EntryOf(at->first, at->second));
     }
     return page;
   }
@@ -102,14 +132,14 @@ class FakeIndex : public indexd::ShareIndex {
     const std::lock_guard lock(mutex);
     const auto found = documents.find(path);
     if (found == documents.end()) return {};
-    return {{path, found->second.stamp, found->second.with_content}};
+    return {EntryOf(path, found->second)};
   }
 
   std::vector<indexd::IndexedEntry> Suspects(const std::string& after, unsigned limit) override {
     const std::lock_guard lock(mutex);
     std::vector<indexd::IndexedEntry> page;
     for (auto at = suspects.upper_bound(after); at != suspects.end() && page.size() < limit; ++at) {
-      if (documents.count(*at) != 0) page.push_back({*at, documents[*at].stamp, documents[*at].with_content});
+      if (documents.count(*at) != 0) page.push_back(EntryOf(*at, documents[*at]));
     }
     return page;
   }
@@ -119,7 +149,7 @@ class FakeIndex : public indexd::ShareIndex {
     std::vector<indexd::IndexedEntry> page;
     for (auto at = documents.upper_bound(after); at != documents.end() && page.size() < limit; ++at) {
       if (!at->second.stamp.ends_with("." + std::to_string(file))) continue;
-      page.push_back({at->first, at->second.stamp, at->second.with_content});
+      page.push_back(EntryOf(at->first, at->second));
     }
     return page;
   }
@@ -131,14 +161,18 @@ class FakeIndex : public indexd::ShareIndex {
   std::atomic<bool> paused{false};
   std::atomic<int64_t> rebuilding{0};
   std::map<std::string, Document> documents;
+  std::map<std::string, std::string> folders;  ///< rights of what has no document
   std::set<std::string> suspects;
   std::map<std::string, int> upserts;
   int creations = 0;
   int renames = 0;
   int lists = 0;
   int commits = 0;
+  std::multiset<size_t> access_sets;                         ///< how many records each had
   std::function<void(const std::string& path)> before_read;  ///< by several threads
+  std::function<void(const std::string& path)> after_read;   ///< by several threads
   std::function<void(const std::string& path)> before_write;
+  std::function<void(const std::vector<wire::SeenAccess>& records)> after_access;
   std::function<void(const std::string& path)> before_attr;
 
  private:
@@ -146,6 +180,17 @@ class FakeIndex : public indexd::ShareIndex {
     struct stat status = {};
     if (lstat(path.c_str(), &status) != 0) throw Error(Error::kParseFailed, "Parse failed, path=" + path);
     return KOVA::CONTENT_EXTRACT::Stamp(status);
+  }
+
+  static std::string AccessOf(const std::string& path) {
+    struct stat status = {};
+    return lstat(path.c_str(), &status) == 0 ? KOVA::CONTENT_EXTRACT::Access(path, status) : "";
+  }
+
+  static indexd::IndexedEntry EntryOf(const std::string& path, const Document& document) {
+    indexd::IndexedEntry entry = {path, document.stamp, document.with_content};
+    entry.has_access = !document.access.empty();
+    return entry;
   }
 
   static std::string ContentOf(const std::string& path) {
@@ -157,10 +202,10 @@ class FakeIndex : public indexd::ShareIndex {
   /// Before the document at `path` gets another stamp, or ("") is removed.
   void Changed(const std::string& path, const std::string& stamp) {
     suspects.erase(path);
-    const std::string before = documents.count(path) != 0 ? documents[path].stamp : stamp;
+    const std::string of = stamp.empty() && documents.count(path) != 0 ? documents[path].stamp : stamp;
+    const std::string file = of.substr(std::min(of.size(), of.rfind('.')));
     for (const auto& [other, document] : documents) {
-      const bool linked = KOVA::CONTENT_EXTRACT::SameFile(document.stamp, stamp.empty() ? before : stamp);
-      if (other != path && linked && document.stamp != stamp) suspects.insert(other);
+      if (other != path && document.stamp.ends_with(file) && document.stamp != stamp) suspects.insert(other);
     }
   }
 
