@@ -55,13 +55,17 @@ class Engine:
     def call(self, command, **data):
         return self.send({"command": command, "data": {"id": ID, **data}})
 
-    def figures(self):
-        """Resident MB, and seconds of processor time."""
+    def memory_mb(self):
         with open(f"/proc/{self.daemon.pid}/status", encoding="ascii") as file:
-            memory = next(int(line.split()[1]) / 1024 for line in file if line.startswith("VmRSS"))
-        with open(f"/proc/{self.daemon.pid}/stat", encoding="ascii") as file:
-            fields = file.read().rpartition(")")[2].split()
-        return memory, (int(fields[11]) + int(fields[12])) / os.sysconf("SC_CLK_TCK")
+            return next(int(line.split()[1]) / 1024 for line in file if line.startswith("VmRSS"))
+
+    def cpu_ms(self):
+        """What its threads have taken; unlike times, it hardly depends on what else the machine does."""
+        total = 0
+        for thread in os.listdir(f"/proc/{self.daemon.pid}/task"):
+            with open(f"/proc/{self.daemon.pid}/task/{thread}/schedstat", encoding="ascii") as file:
+                total += int(file.read().split()[0])
+        return total / 1e6
 
     def stop(self):
         self.daemon.send_signal(signal.SIGTERM)
@@ -100,7 +104,7 @@ def build_index(engine, root, count):
     places = [folder for level in folders()[1:] for folder in level]
     each = max(1, (count - len(places)) // len(places))
     parts = []
-    before, begin = engine.figures()[1], time.monotonic()
+    before, begin = engine.cpu_ms(), time.monotonic()
 
     def put(path, number):
         parts.append({"command": "document_upsert_by_id",
@@ -119,18 +123,21 @@ def build_index(engine, root, count):
         engine.send({"compound": parts})
     engine.call("commit")
     print(f"build: {engine.call('index_stat')['documents']} documents in {len(places)} folders, "
-          f"{time.monotonic() - begin:.0f} s, {engine.figures()[1] - before:.1f} s of CPU of the engine", flush=True)
+          f"{time.monotonic() - begin:.0f} s, {(engine.cpu_ms() - before) / 1000:.1f} s of CPU of the engine", flush=True)
 
 
 def timed(engine, query):
-    begin = time.monotonic()
+    """Milliseconds, those of the engine's processor time, and how many were found."""
+    cpu, begin = engine.cpu_ms(), time.monotonic()
     total = engine.call("search", query=query)["total"]
-    return 1000 * (time.monotonic() - begin), total
+    return 1000 * (time.monotonic() - begin), engine.cpu_ms() - cpu, total
 
 
 def show(name, times):
-    times.sort()
-    return f"{name} {times[len(times) // 2]:.1f} / {times[int(len(times) * 0.99)]:.1f} ms"
+    def percentiles(values):
+        values = sorted(values)
+        return f"{values[len(values) // 2]:.1f} / {values[int(len(values) * 0.99)]:.1f}"
+    return f"{name} {percentiles(wall for wall, _, _ in times)} ({percentiles(cpu for _, cpu, _ in times)})"
 
 
 def measure_queries(engine, rounds):
@@ -138,23 +145,28 @@ def measure_queries(engine, rounds):
     levels = folders()
     for query in QUERIES:
         timed(engine, query)
-    print(f"memory after queries without path: {engine.figures()[0]:.0f} MB", flush=True)
-    first, total = timed(engine, f"often path:{levels[1][0]}")
-    print(f"first query with path:, of a share: {first:.0f} ms, {total} found; memory {engine.figures()[0]:.0f} MB")
+    print(f"memory after queries without path: {engine.memory_mb():.0f} MB", flush=True)
+    first, cpu, total = timed(engine, f"often path:{levels[1][0]}")
+    print(f"first query with path:, of a share: {first:.0f} ms, {cpu:.0f} of processor time, "
+          f"{total} found; memory {engine.memory_mb():.0f} MB")
     names = ("all", "share", "part", "group", "folder")
     every = {name: [] for name in ("without", *names)}
-    print("p50 / p99 of", rounds, "queries")
+    print(f"p50 / p99 in ms of {rounds} queries (of their processor time)")
     for query in (*QUERIES, ""):
         line = []
         for name, level in (("without", None), *zip(names, levels)):
             if name == "without" and not query:
                 continue
-            times = [timed(engine, query if level is None else f"{query} path:{choose.choice(level)}")[0] for _ in range(rounds)]
+            times = [timed(engine, query if level is None else f"{query} path:{choose.choice(level)}")
+                     for _ in range(rounds)]
             every[name] += times if query else []
             line.append(show(name, times))
         print(f"  {query or 'path: alone':24}", ", ".join(line), flush=True)
     print("  all queries             ", ", ".join(show(name, times) for name, times in every.items()))
-    print(f"memory after these: {engine.figures()[0]:.0f} MB", flush=True)
+    for name in names:
+        added = sorted(b[1] - a[1] for a, b in zip(every["without"], every[name]))
+        print(f"  {name}: adds {added[len(added) // 2]:.1f} / {added[int(len(added) * 0.99)]:.1f} ms of processor time")
+    print(f"memory after these: {engine.memory_mb():.0f} MB", flush=True)
 
 
 def measure_changes(engine, rounds):
@@ -162,7 +174,7 @@ def measure_changes(engine, rounds):
     choose = random.Random(3)
     leaves = folders()[-1]
     for name, query in (("", None), (", a query with path: before each", f"often path:{leaves[0].rsplit('/', 3)[0]}")):
-        begin, before = time.monotonic(), engine.figures()[1]
+        begin, before = time.monotonic(), engine.cpu_ms()
         searching = 0
         for i in range(rounds):
             if query is not None:
@@ -172,7 +184,7 @@ def measure_changes(engine, rounds):
             engine.call("commit")
         print(f"change 1 + commit{name}: {1000 * (time.monotonic() - begin - searching) / rounds:.1f} ms"
               + (f", the query {1000 * searching / rounds:.1f} ms" if query else
-                 f", {1000 * (engine.figures()[1] - before) / rounds:.1f} ms of CPU"), flush=True)
+                 f", {(engine.cpu_ms() - before) / rounds:.1f} ms of CPU"), flush=True)
 
 
 def measure_listing(engine):
@@ -206,7 +218,7 @@ def main():
     answering = time.monotonic() - begin
     engine.call("index_stat")
     print(f"start: answers after {answering:.2f} s, the index is open after {time.monotonic() - begin:.2f} s; "
-          f"memory {engine.figures()[0]:.0f} MB", flush=True)
+          f"memory {engine.memory_mb():.0f} MB", flush=True)
     try:
         measure_queries(engine, options.rounds)
         measure_changes(engine, options.rounds)

@@ -1,6 +1,7 @@
 // Catches searches that wait for writers, and committed changes lost beside failures, full disks and threads.
 #include "services/kovaelasticd/indices/index.h"
 
+#include <atomic>
 #include <filesystem>
 #include <functional>
 #include <future>
@@ -79,6 +80,31 @@ TEST_F(IndexTest, WhatNobodyCommitsIsCommittedAfterAWhile) {
   while (Total("lantern") == 0) std::this_thread::yield();
   while (std::filesystem::exists(folder_ / "uncommitted")) std::this_thread::yield();
   EXPECT_EQ(CommitCode(), 0);
+}
+
+/// Has something to give back after each search.
+class HoldingStore : public SqliteStore {
+ public:
+  using SqliteStore::SqliteStore;
+  SearchReply Search(const SearchRequest& request) override {
+    holds = true;
+    return SqliteStore::Search(request);
+  }
+  std::optional<std::chrono::steady_clock::time_point> NextGiveBack() const override {
+    return holds ? std::optional(std::chrono::steady_clock::now()) : std::nullopt;
+  }
+  void GiveBack(std::chrono::steady_clock::time_point /*now*/) override { holds = false; }
+  std::atomic<bool> holds{false};
+};
+
+TEST_F(IndexTest, WhatASearchLeavesInMemoryIsGivenBackWithoutARequest) {
+  auto store = std::make_unique<HoldingStore>(folder_ / "index.sqlite", true, PlainSchema());
+  const HoldingStore& holding = *store;
+  index_ = std::make_unique<Index>(std::move(store), folder_ / "uncommitted", std::chrono::hours(1));
+  for (int round = 0; round < 3; ++round) {
+    EXPECT_EQ(Total("lantern"), 0);
+    while (holding.holds) std::this_thread::yield();
+  }
 }
 
 TEST_F(IndexTest, ManyWritersAndReadersAgree) {

@@ -160,7 +160,12 @@ class StoreModel {
     condition.Apply(all, false);
     ASSERT_EQ(std::ssize(committed_), found.Count() + all.Count());
     reader->database.Execute("COMMIT");
-    if (random_() % 5 == 0) reader->places.GiveBack(std::chrono::steady_clock::now() + PlacesCache::kIdle);
+    if (random_() % 5 == 0) {
+      const auto later = std::chrono::steady_clock::now() + PlacesCache::kIdle;
+      reader->places.GiveBack(later);
+      store_->GiveBack(later);
+      ASSERT_FALSE(store_->NextGiveBack().has_value());
+    }
     readers_.Return(std::move(reader));
   }
 

@@ -14,10 +14,6 @@ namespace {
 
 using SteadyClock = std::chrono::steady_clock;
 
-/// Between two turns of clearing, at the latest, and after one that failed.
-constexpr std::chrono::milliseconds kClearLatest{250};
-constexpr std::chrono::seconds kClearAgain{60};
-
 constexpr char kClosedText[] = "the index was closed meanwhile; resume it";
 constexpr char kLostText[] =
     "changes since the last commit were lost, because the engine was killed or its disk was full; send them again";
@@ -40,17 +36,6 @@ Index::Index(std::unique_ptr<IndexStore> store, std::string marker_path, std::ch
 }
 
 Index::~Index() { Close(); }
-
-/// Runs what uses the store; on_damage_ is called when that finds the file damaged.
-template <typename Run>
-auto Index::ReportingDamage(Run run) {
-  try {
-    return run();
-  } catch (const IndexDamaged&) {
-    on_damage_();
-    throw;
-  }
-}
 
 void Index::Write(const Job& job) { Submit(Kind::kWrite, &job); }
 
@@ -82,7 +67,9 @@ auto Index::Reading(Use use) {
 }
 
 SearchReply Index::Search(const SearchRequest& request) {
-  return Reading([&](auto& from) { return from.Search(request); });
+  SearchReply reply = Reading([&](auto& from) { return from.Search(request); });
+  PlanGiveBack();
+  return reply;
 }
 
 StoreStat Index::Stat() {
@@ -118,14 +105,6 @@ void Index::Close() {
   upgrade_.reset();
   scrubber_.reset();  // the last connection that is closed empties the log, and removes it: the store's
   store_.reset();
-}
-
-/// When the thread has something to do without a task: an automatic commit, or else a turn of clearing, or of the
-/// scrubber.
-std::optional<SteadyClock::time_point> Index::NextOwnWork() const {
-  if (uncommitted_ > 0) return auto_commit_at_;
-  if (store_->Uncleared() > 0) return clear_at_;
-  return scrubber_ == nullptr ? std::nullopt : std::optional(scrubber_->NextTurn());
 }
 
 /// Waits for tasks and takes all of them; none when it is time for NextOwnWork, or the end.
@@ -178,12 +157,7 @@ void Index::ThreadMain() {
                      (stop || SteadyClock::now() >= auto_commit_at_ || store_->UncommittedBytes() >= kAutoCommitBytes);
     if (due) CommitByItself();
     if (stop) return;
-    if (uncommitted_ > 0) continue;
-    if (store_->Uncleared() > 0) {
-      Clear(!tasks.empty());
-    } else if (tasks.empty() && scrubber_ != nullptr) {
-      Scrub();
-    }
+    DoOwnWork(!tasks.empty());
   }
 }
 
@@ -253,27 +227,6 @@ void Index::CommitByItself() {
     if (!lost_) Unmark();
   } catch (const std::exception&) {
     // Logged where it arose; the next commit that somebody asks for fails.
-  }
-}
-
-/// While tasks come all the time, a turn is done after kClearLatest all the same.
-void Index::Clear(bool busy) {
-  const SteadyClock::time_point now = SteadyClock::now();
-  if (now < clear_at_ || (busy && now < clear_at_ + kClearLatest)) return;
-  try {
-    ReportingDamage([&] { store_->ClearSome(); });
-    clear_at_ = SteadyClock::now();
-  } catch (const std::exception&) {
-    LoseChanges();  // logged where it arose
-    clear_at_ = SteadyClock::now() + kClearAgain;
-  }
-}
-
-void Index::Scrub() {
-  try {
-    ReportingDamage([&] { scrubber_->Turn(); });
-  } catch (const std::exception&) {
-    // Logged where it arose. A damaged index is made anew with the next request to the engine.
   }
 }
 

@@ -14,6 +14,7 @@
 #include "services/kovaelasticd/indices/index_upgrade.h"
 #include "services/kovaelasticd/store/index_store.h"
 #include "services/kovaelasticd/store/scrubber.h"
+#include "services/kovaelasticd/store/sqlite_db.h"
 
 namespace ferrox::engine {
 
@@ -87,13 +88,23 @@ class Index {
   void CommitFor(const std::deque<Task*>& waiting);
   void CommitByItself();
   void CommitStore();
+  void DoOwnWork(bool busy);
+  void PlanGiveBack();
   void Clear(bool busy);
   void Scrub();
   void LoseChanges();
   void Mark();
   void Unmark();
+  /// Runs what uses the store; on_damage_ is called when that finds the file damaged.
   template <typename Run>
-  auto ReportingDamage(Run run);
+  auto ReportingDamage(Run run) {
+    try {
+      return run();
+    } catch (const IndexDamaged&) {
+      on_damage_();
+      throw;
+    }
+  }
 
   /// Held for reading by a search and a figure of the store, for writing by Close and at the end of an upgrade. The
   /// thread, which alone writes to the store, uses it without: Close waits for its end first.
@@ -113,10 +124,11 @@ class Index {
   bool stopping_ BASE_GUARDED_BY(mutex_) = false;
   bool upgrading_ BASE_GUARDED_BY(mutex_) = false;  ///< there is no store yet
 
-  // Of the thread alone, except for reading the count.
+  // Of the thread alone, except for reading the count and what is said otherwise.
   std::atomic<int64_t> uncommitted_{0};
-  bool marked_ = false;  ///< the marker file is there
-  bool lost_ = false;    ///< changes that were answered with success are gone, and no commit has failed for it yet
+  std::atomic<bool> gives_back_{false};  ///< the thread asks for what it may give back; also set by searches
+  bool marked_ = false;                  ///< the marker file is there
+  bool lost_ = false;  ///< changes that were answered with success are gone, and no commit has failed for it yet
   std::chrono::steady_clock::time_point auto_commit_at_;  ///< while uncommitted_ is above 0
   std::chrono::steady_clock::time_point clear_at_;        ///< while documents are to be cleared
 

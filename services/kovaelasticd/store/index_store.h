@@ -1,9 +1,11 @@
 #pragma once
 
+#include <chrono>
 #include <cstdint>
 #include <functional>
 #include <map>
 #include <memory>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -130,6 +132,10 @@ class IndexStore {
   /// uncommitted. To be called until Uncleared is 0; what is left at the end of the process is there when the index is
   /// opened again.
   virtual void ClearSome() = 0;
+  /// When to call GiveBack next; nothing while there is nothing to give back. For any thread.
+  virtual std::optional<std::chrono::steady_clock::time_point> NextGiveBack() const { return std::nullopt; }
+  /// Frees memory that only saves time, if nobody has used it for some minutes before `now`.
+  virtual void GiveBack(std::chrono::steady_clock::time_point /*now*/) {}
   /// Rebuilds the words that are suggested when a search finds nothing; ClearSome does it at its end while documents
   /// are to be cleared.
   virtual void RebuildSuggestions() = 0;

@@ -38,6 +38,7 @@ std::vector<int64_t> ListedDocuments::Page(const GetRequest& request) {
     file_ = file;
     Gather(request.after);
   }
+  used_ = SteadyClock::now();
   std::vector<int64_t> page;
   const auto page_max = request.limit < 0 ? std::numeric_limits<size_t>::max() : static_cast<size_t>(request.limit);
   while (page.size() < page_max) {
@@ -115,6 +116,7 @@ void ListedDocuments::OnRow(RowWatch::Table table, int64_t number, bool is_updat
 }
 
 void ListedDocuments::Forget() {
+  used_ = SteadyClock::time_point();
   list_ = List::kNone;
   kept_ = {};
   changed_ = {};

@@ -1,6 +1,9 @@
 #pragma once
 
+#include <atomic>
+#include <chrono>
 #include <cstdint>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -17,6 +20,8 @@ namespace ferrox::engine {
 /// would be had it been made anew. For the thread that writes; members throw Error kEngineStorage.
 class ListedDocuments {
  public:
+  using SteadyClock = std::chrono::steady_clock;
+
   /// Both must outlive this.
   ListedDocuments(Database& database, FolderTree& tree) : database_(database), tree_(tree) {}
 
@@ -24,8 +29,13 @@ class ListedDocuments {
   std::vector<int64_t> Page(const GetRequest& request);
   /// To be called with each row that changes.
   void OnRow(RowWatch::Table table, int64_t number, bool is_update);
-  /// Drops what is kept: after a rollback, or when no page has been asked for in a while.
+  /// Drops what is kept, as after a rollback.
   void Forget();
+  /// When the last page was asked for; nothing while nothing is kept. For any thread.
+  std::optional<SteadyClock::time_point> Used() const {
+    const SteadyClock::time_point used = used_;
+    return used == SteadyClock::time_point() ? std::nullopt : std::optional(used);
+  }
 
  private:
   static constexpr size_t kKeptMaxBytes = 8 << 20;
@@ -45,6 +55,7 @@ class ListedDocuments {
 
   Database& database_;
   FolderTree& tree_;
+  std::atomic<SteadyClock::time_point> used_{};
   List list_ = List::kNone;       ///< that of kept_; kNone: nothing is kept
   int64_t file_ = 0;              ///< of kFile
   std::string after_;             ///< kept_ has what is behind this path,

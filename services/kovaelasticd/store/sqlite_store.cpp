@@ -139,6 +139,20 @@ void SqliteStore::RebuildSuggestions() {
   uncommitted_bytes_ += 1;  // so that there is something to commit
 }
 
+/// The places that searches use, and the order of a listing that ended before its last page.
+std::optional<std::chrono::steady_clock::time_point> SqliteStore::NextGiveBack() const {
+  const auto places = readers_.SharedPlaces().NextGiveBack();
+  const auto listed = listed_.Used();
+  if (!listed.has_value()) return places;
+  const auto end = *listed + PlacesCache::kIdle;
+  return places.has_value() ? std::min(*places, end) : end;
+}
+
+void SqliteStore::GiveBack(std::chrono::steady_clock::time_point now) {
+  readers_.SharedPlaces().GiveBack(now);
+  if (const auto listed = listed_.Used(); listed.has_value() && now >= *listed + PlacesCache::kIdle) listed_.Forget();
+}
+
 StoreStat SqliteStore::Stat() { return ReadStat(readers_); }
 
 }  // namespace ferrox::engine

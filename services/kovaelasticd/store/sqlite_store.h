@@ -43,6 +43,8 @@ class SqliteStore : public IndexStore {
   int64_t UncommittedBytes() const override { return uncommitted_bytes_; }
   int64_t Uncleared() const override { return totals_.clearing; }
   void ClearSome() override;
+  std::optional<std::chrono::steady_clock::time_point> NextGiveBack() const override;
+  void GiveBack(std::chrono::steady_clock::time_point now) override;
   void RebuildSuggestions() override;
   SearchReply Search(const SearchRequest& request) override;  ///< defined in search/, whose parts it is made of
   StoreStat Stat() override;

@@ -49,6 +49,7 @@ class ReaderPool {
   /// Takes a connection back that has no transaction open. After a failure do not return it: it is closed then.
   void Return(std::unique_ptr<StoreReader> reader);
   PlacesCache& SharedPlaces() { return places_; }
+  const PlacesCache& SharedPlaces() const { return places_; }
 
  private:
   const std::string path_;
