@@ -163,9 +163,6 @@ def measure_queries(engine, rounds):
             line.append(show(name, times))
         print(f"  {query or 'path: alone':24}", ", ".join(line), flush=True)
     print("  all queries             ", ", ".join(show(name, times) for name, times in every.items()))
-    for name in names:
-        added = sorted(b[1] - a[1] for a, b in zip(every["without"], every[name]))
-        print(f"  {name}: adds {added[len(added) // 2]:.1f} / {added[int(len(added) * 0.99)]:.1f} ms of processor time")
     print(f"memory after these: {engine.memory_mb():.0f} MB", flush=True)
 
 
@@ -174,17 +171,16 @@ def measure_changes(engine, rounds):
     choose = random.Random(3)
     leaves = folders()[-1]
     for name, query in (("", None), (", a query with path: before each", f"often path:{leaves[0].rsplit('/', 3)[0]}")):
-        begin, before = time.monotonic(), engine.cpu_ms()
-        searching = 0
+        changes, searches = [], []
         for i in range(rounds):
             if query is not None:
-                searching += timed(engine, query)[0] / 1000
+                searches.append(timed(engine, query))
             path = f"{choose.choice(leaves)}/new_{i}{len(name)}.txt"
+            cpu, begin = engine.cpu_ms(), time.monotonic()
             engine.call("document_upsert_by_id", doc_id=path, data=document(path, 10000001 + i, choose))
             engine.call("commit")
-        print(f"change 1 + commit{name}: {1000 * (time.monotonic() - begin - searching) / rounds:.1f} ms"
-              + (f", the query {1000 * searching / rounds:.1f} ms" if query else
-                 f", {(engine.cpu_ms() - before) / rounds:.1f} ms of CPU"), flush=True)
+            changes.append((1000 * (time.monotonic() - begin), engine.cpu_ms() - cpu, 1))
+        print(show("change 1 + commit" + name, changes) + (show(", the query", searches) if query else ""), flush=True)
 
 
 def measure_listing(engine):

@@ -157,6 +157,7 @@ class StoreModel {
     found = all;
     condition.Apply(found, true);
     ASSERT_EQ(expected, found.Count()) << folder;
+    ASSERT_EQ(expected, condition.AllDocuments().Count()) << folder;
     condition.Apply(all, false);
     ASSERT_EQ(std::ssize(committed_), found.Count() + all.Count());
     reader->database.Execute("COMMIT");

@@ -11,6 +11,8 @@ namespace {
 /// Up to so many documents are looked at by their rows, and so many folders are listed, at some microseconds each.
 constexpr int64_t kOneByOneMax = 200;
 constexpr size_t kFoldersListedMax = 200;
+/// Of the documents with so many numbers the places are looked at in the time in which a folder is listed.
+constexpr size_t kPlacesForAFolder = 4096;
 
 }  // namespace
 
@@ -20,13 +22,13 @@ PathCondition::PathCondition(StoreReader& reader, int64_t version, const std::st
   if (itself.has_value()) itself_ = itself->id;
 }
 
-std::optional<std::vector<int64_t>> PathCondition::FewFolders() {
+std::optional<std::vector<int64_t>> PathCondition::FewFolders(size_t most) {
   std::vector<int64_t> folders;
   if (folder_ != FolderTree::kNone) folders.push_back(folder_);
   Statement below = reader_.database.Prepare("SELECT id FROM folders WHERE parent = ?1");
   for (size_t i = 0; i < folders.size(); ++i) {
     for (below.Bind(1, folders[i]); below.Step();) {
-      if (folders.size() == kFoldersListedMax) return std::nullopt;
+      if (folders.size() >= most) return std::nullopt;
       folders.push_back(below.Int(0));
     }
     below.Reset();
@@ -47,8 +49,11 @@ DocSet PathCondition::DocumentsIn(const std::vector<int64_t>& folders) {
 
 DocSet PathCondition::AllDocuments() {
   if (reader_.tree.IsFlat()) return DocumentsAtWholePath(reader_.database, path_);
-  if (const auto folders = FewFolders(); folders.has_value()) return DocumentsIn(*folders);
-  const std::shared_ptr<const Places> places = reader_.places.Load(reader_.database, version_);
+  std::shared_ptr<const Places> places;
+  if (reader_.places.IsLoaded()) places = reader_.places.Load(reader_.database, version_);
+  const size_t most = places == nullptr ? kFoldersListedMax : places->Documents().End() / kPlacesForAFolder + 1;
+  if (const auto folders = FewFolders(most); folders.has_value()) return DocumentsIn(*folders);
+  if (places == nullptr) places = reader_.places.Load(reader_.database, version_);
   FoldersBelow below(*places, folder_);
   DocSet found;
   const auto end = static_cast<int64_t>(places->Documents().End());
@@ -69,7 +74,7 @@ void PathCondition::Apply(DocSet& documents, bool wanted) {
   if (reader_.tree.IsFlat()) return combine(DocumentsAtWholePath(reader_.database, path_));
   if (!reader_.places.IsLoaded()) {
     if (documents.Count() <= kOneByOneMax) return keep([this](int64_t id) { return HoldsByRow(id); });
-    if (const auto folders = FewFolders(); folders.has_value()) return combine(DocumentsIn(*folders));
+    if (const auto folders = FewFolders(kFoldersListedMax); folders.has_value()) return combine(DocumentsIn(*folders));
   }
   const std::shared_ptr<const Places> places = reader_.places.Load(reader_.database, version_);
   FoldersBelow below(*places, folder_);

@@ -27,8 +27,8 @@ class PathCondition {
 
  private:
   bool HoldsByRow(int64_t id);
-  /// The folder and those below it; nothing when they are many.
-  std::optional<std::vector<int64_t>> FewFolders();
+  /// The folder and those below it; nothing when there are more than `most`.
+  std::optional<std::vector<int64_t>> FewFolders(size_t most);
   DocSet DocumentsIn(const std::vector<int64_t>& folders);
 
   StoreReader& reader_;
