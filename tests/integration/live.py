@@ -1,14 +1,17 @@
 """An instance whose notification daemon watches the disk, and what its index must hold, for the tests of the live road."""
 
+import contextlib
 import json
 import os
 import stat
+import struct
 import time
 
 from instance import TIMEOUT, Instance, differences, write
 
 WAYS = ("fanotify", "fanotify inode marks", "inotify", "periodic scan")
-FIELDS = ("KOVAMDPath", "KOVAMDIsDir", "KOVAMDFSSize", "KOVAMDFSContentChangeDate", "_KOVAStamp", "KOVAMDTextContent")
+FIELDS = ("KOVAMDPath", "KOVAMDIsDir", "KOVAMDFSSize", "KOVAMDFSContentChangeDate", "_KOVAStamp", "_KOVAAccess",
+          "KOVAMDTextContent")
 
 
 class LiveInstance(Instance):
@@ -58,7 +61,8 @@ class LiveInstance(Instance):
         entries = self.entries(share, self.shares[share], *FIELDS)
         return {entry["KOVAMDPath"]: facts(entry["KOVAMDIsDir"], entry["KOVAMDFSSize"],
                                            entry["KOVAMDFSContentChangeDate"], entry["_KOVAStamp"],
-                                           entry.get("KOVAMDTextContent", "")) for entry in entries}
+                                           entry.get("_KOVAAccess"), entry.get("KOVAMDTextContent", ""))
+                for entry in entries}
 
     def differences(self):
         """Of all shares, per path, what is on the disk and what is in the index, each without what both have."""
@@ -79,16 +83,28 @@ def disk(folder):
             is_folder = stat.S_ISDIR(status.st_mode)
             stamp = f"{status.st_size}.{status.st_mtime_ns}.{status.st_ctime_ns}.{status.st_ino}"
             found[entry.path] = facts(is_folder, status.st_size, status.st_mtime_ns // 10**9, stamp,
-                                      "" if is_folder else text(entry.path))
+                                      access(entry.path, status), "" if is_folder else text(entry.path))
             if is_folder:
                 found.update(disk(entry.path))
     return found
 
 
-def facts(is_folder, size, seconds, stamp, content):
+def access(path, status):
+    """Who may do what with a file, as the index says it."""
+    entries = []
+    with contextlib.suppress(OSError):  # it has no ACL
+        acl = os.getxattr(path, "system.posix_acl_access", follow_symlinks=False)
+        for tag, allowed, number in struct.iter_unpack("<HHI", acl[4:]):
+            if tag in (2, 4, 8):
+                entries.append(f"{'u' if tag == 2 else 'g'}{'' if tag == 4 else number}={allowed}")
+    mode = f"{status.st_uid}:{status.st_gid}:{stat.S_IMODE(status.st_mode):04o}"
+    return ":".join([mode, ",".join(entries)] if entries else [mode])
+
+
+def facts(is_folder, size, seconds, stamp, rights, content):
     if is_folder:  # what changes in a folder is told, not that the folder's own size and times change
-        return {"folder": True, "inode": stamp.split(".")[3]}
-    return {"folder": False, "size": size, "mtime": seconds, "stamp": stamp, "text": content}
+        return {"folder": True, "inode": stamp.split(".")[3], "rights": rights}
+    return {"folder": False, "rights": rights, "size": size, "mtime": seconds, "stamp": stamp, "text": content}
 
 
 def text(path):

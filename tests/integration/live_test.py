@@ -7,6 +7,7 @@ import mmap
 import os
 import shutil
 import signal
+import struct
 import subprocess
 import sys
 import tempfile
@@ -69,6 +70,18 @@ class Changes:
     def step_folder_moved_in_in_full(self):
         shutil.copytree(f"{self.docs}/full", f"{self.outside}/full")
         os.rename(f"{self.outside}/full", f"{self.docs}/again")
+
+    def step_rights(self):
+        os.chmod(self.docs, 0o711)
+        os.chmod(f"{self.docs}/full/2", 0o2750)
+        for number, path in enumerate(f"{self.docs}/full/{number % 5}/0/f{number}.txt" for number in range(0, 60, 15)):
+            os.chmod(path, 0o604 + number)
+            if os.geteuid() == 0:
+                os.chown(path, 1000 + number, NOBODY)
+        entries = ((1, 6, -1), (2, 4, 5001), (4, 0, -1), (8, 6, 200), (16, 4, -1), (32, 0, -1))
+        acl = struct.pack("<I", 2) + b"".join(struct.pack("<HHi", *entry) for entry in entries)
+        with contextlib.suppress(OSError):  # no ACLs here
+            os.setxattr(f"{self.docs}/full/0/0/f0.txt", "system.posix_acl_access", acl)
 
     def step_file_becomes_folder_and_back(self):
         write(f"{self.docs}/turn", "file")
@@ -258,6 +271,7 @@ class LiveTest(unittest.TestCase):
                 os.kill(self.instance.pid("kovanotifyd"), signal.SIGSTOP)
                 os.link(f"{docs}/a.txt", name)
                 write(name, f"turn {turn} of {name}")
+                os.chmod(name, 0o640 + turn)
                 go(name)
                 os.kill(self.instance.pid("kovanotifyd"), signal.SIGCONT)
                 if turn == 2:  # what was queued is not lost
