@@ -12,6 +12,10 @@ Workloads, each in an instance of its own, with text files of 50 words drawn at 
   slow     the same on an instance that indexes 200 PDFs beside, each of which takes a reader some seconds.
   bulk     a tree of --bulk files in folders of 16, three deep, copied into the share; a folder with --files files renamed,
            and removed: seconds that the operation itself took, and until both daemons have answered "sync" behind it.
+  rights   chmod -R of --files files: seconds until both daemons have answered "sync" behind it, and the processor time of
+           index daemon and engine. Then a share of as many files is indexed for the first time, and single files that it has
+           already, one of them under a name outside of the share, have their mode changed: the clock runs until the index
+           has the new one.
 Behind each clock the index is compared with the disk, every path, size, time and text; a difference ends the program.
 
 Needs: a build (--build).
@@ -173,7 +177,7 @@ def bench_slow(instance, options, rng):
     print(f"slow documents read meanwhile: {read}; it was {begin['state']} and is {end['state']}", flush=True)
 
 
-def timed(instance, name, operation):
+def timed(instance, name, operation, behind=lambda: None):
     before, begin = lost(instance), time.monotonic()
     operation()
     done = time.monotonic() - begin
@@ -181,6 +185,7 @@ def timed(instance, name, operation):
     equal = time.monotonic() - begin
     print(f"{name:44} {done:7.1f} s, until all is searchable {equal:7.1f} s; lost {lost(instance) - before} times"
           f"{'; ' + str(problems) if problems else ''}", flush=True)
+    behind()
     check(instance)
 
 
@@ -228,9 +233,59 @@ def bench_bulk(instance, options, rng):
           lambda: subprocess.run(["rm", "-rf", f"{docs}/renamed"], check=True))
 
 
+def cpu_seconds(instance, *programs):
+    """Of each program, in user and system mode, since it started."""
+    seconds = []
+    for program in programs:
+        with open(f"/proc/{instance.pid(program)}/stat", encoding="ascii") as file:
+            times = file.read().rsplit(")", 1)[1].split()[11:13]
+        seconds.append(sum(map(int, times)) / os.sysconf("SC_CLK_TCK"))
+    return seconds
+
+
+def indexed_access(instance, share, path):
+    query = {"qsl": {"term": {"KOVAMDPath": path}}, "load_field": ["_KOVAAccess"]}
+    reply = instance.ask("kovaelasticd", {"command": "document_get_by_query",
+                                          "data": {"id": "fileindex_" + share, "query": query}})
+    return reply["data"][0]["_KOVAAccess"] if reply["success"] and reply["data"] else None
+
+
+def bench_rights(instance, options, rng):
+    docs, daemons = instance.share("docs"), ("fileindexd", "kovaelasticd")
+    make_tree(docs, options.files, rng)
+    check(instance)
+    for mode in ("u=rwX,g=rX,o=", "u=rwX,g=rX,o=rX", "u=rwX,g=rwX,o="):
+        before = cpu_seconds(instance, *daemons)
+        timed(instance, f"chmod -R of {options.files} files",
+              lambda mode=mode: subprocess.run(["chmod", "-R", mode, docs], check=True),
+              lambda: print("processor time:", ", ".join(
+                  f"{name} {after - begin:.2f} s" for name, begin, after in
+                  zip(daemons, before, cpu_seconds(instance, *daemons)))))
+    first, outside = f"{instance.root}/vol/first", f"{instance.root}/vol/outside.txt"
+    make_tree(first, options.files, rng)
+    paths = [f"{os.path.realpath(first)}/0/{number}/file{number * 16}.txt" for number in range(10)]
+    os.link(paths[0], outside)
+    instance.share("first", os.path.realpath(first))
+    while indexed_access(instance, "first", paths[-1]) is None:
+        time.sleep(0.05)
+    waits, number = [], 0
+    while instance.share_status("first")["state"] == "indexing" and len(waits) < options.samples:
+        path = paths[number % len(paths)]
+        mode = 0o600 + number // len(paths) % 0o100
+        begin = time.monotonic()
+        os.chmod(outside if path == paths[0] else path, mode)
+        while not indexed_access(instance, "first", path).endswith(f":{mode:04o}"):
+            time.sleep(0.005)
+        waits.append(time.monotonic() - begin)
+        number += 1
+        time.sleep(rng.random() * 0.1)
+    show("beside a first index", waits, 0.005)
+    check(instance)
+
+
 def main():
     parser = argparse.ArgumentParser(description=__doc__, formatter_class=argparse.RawDescriptionHelpFormatter)
-    parser.add_argument("workloads", nargs="*", help="latency, slow, return, bulk; absent: all")
+    parser.add_argument("workloads", nargs="*", help="latency, slow, return, bulk, rights; absent: all")
     parser.add_argument("--build", default=f"{SOURCE}/build/release")
     parser.add_argument("--way", default="", choices=sorted(WAY), help="of watching; absent: the daemon's choice")
     parser.add_argument("--samples", type=int, default=300)
@@ -242,7 +297,8 @@ def main():
     sys.path.insert(0, f"{SOURCE}/tests/integration")
     from live import LiveInstance  # pylint: disable=import-outside-toplevel
 
-    for name, bench in (("latency", bench_latency), ("slow", bench_slow), ("return", bench_return), ("bulk", bench_bulk)):
+    for name, bench in (("latency", bench_latency), ("slow", bench_slow), ("return", bench_return), ("bulk", bench_bulk),
+                        ("rights", bench_rights)):
         if options.workloads and name not in options.workloads:
             continue
         instance = LiveInstance()
