@@ -17,7 +17,7 @@ class IndexStoreTest : public testing::Test {
   void Reopen() {
     store_.reset();
     auto store = std::make_unique<SqliteStore>(folder_ / "index.sqlite", true, PlainSchema());
-    store->LimitClearing({2, 1, 1});
+    store->LimitClearing({2, 1, 1, 1, 0});
     store_ = std::move(store);
   }
   void Put(const Json::Value& document) { store_->Upsert(document["KOVAMDPath"].asString(), document); }

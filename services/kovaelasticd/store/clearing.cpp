@@ -1,13 +1,15 @@
 #include "services/kovaelasticd/store/clearing.h"
 
-#include <charconv>
+#include <algorithm>
 
 #include "services/kovaelasticd/store/access_records.h"
-#include "services/kovaelasticd/store/doc_set.h"
 
 namespace ferrox::engine {
 
 namespace {
+
+/// A document whose words are taken out already costs that part of one whose are not.
+constexpr int64_t kPurgedShare = 8;
 
 /// So that the order of names is that of their numbers.
 std::string GoneName(uint64_t number) {
@@ -16,11 +18,6 @@ std::string GoneName(uint64_t number) {
 }
 
 }  // namespace
-
-void Clearing::Load() {
-  const std::string newest = FolderTree::NewestGone(database_);
-  (void)std::from_chars(newest.data(), newest.data() + newest.size(), last_name_);
-}
 
 bool Clearing::IsLarge(int64_t folder) {
   std::vector<int64_t> folders = {folder};
@@ -48,17 +45,55 @@ void Clearing::TakeOut(int64_t folder) {
     }
     rows.Reset();
   }
-  tree_.TakeOut(folder, GoneName(++last_name_));
+  // Higher than all names before, also those of before the index was opened.
+  last_name_ = std::max(last_name_ + 1, static_cast<uint64_t>(totals_.version + 1) << 20);
+  tree_.TakeOut(folder, GoneName(last_name_));
   links_.OnTakenOut(documents);
 }
 
+void Clearing::Forget() {
+  folders_.clear();
+  purge_.reset();
+}
+
 void Clearing::Turn() {
-  int64_t documents_left = limits_.turn_documents;
+  const bool is_large_part = totals_.clearing * limits_.purged_part >= totals_.documents + totals_.clearing;
+  if (purge_ == nullptr && folders_.empty() && can_purge_ && is_large_part) BeginPurge();
+  purge_ != nullptr && !purge_->done ? ContinuePurge() : RemoveRows();
+}
+
+void Clearing::BeginPurge() {
+  purge_ = std::make_unique<Purge>(database_);
+  Statement documents = database_.Prepare("SELECT id FROM docs WHERE folder = ?1");
+  for (const int64_t gone : FolderTree::GoneAfter(database_, "")) {
+    for (const int64_t folder : tree_.AtAndBelow(gone)) {
+      for (documents.Bind(1, folder); documents.Step();) purge_->documents.Add(documents.Int(0));
+      documents.Reset();
+    }
+  }
+}
+
+void Clearing::ContinuePurge() {
+  int64_t pages = limits_.turn_pages;
+  WordPurge::Result result = purge_->content.Turn(purge_->documents, pages);
+  if (result == WordPurge::Result::kDone) result = purge_->meta.Turn(purge_->documents, pages);
+  purge_->done = result == WordPurge::Result::kDone;
+  if (result != WordPurge::Result::kUnknownFormat) return;
+  can_purge_ = false;
+  purge_.reset();
+}
+
+/// With the words of those that were not purged.
+void Clearing::RemoveRows() {
+  int64_t documents_left = limits_.turn_documents * (purge_ != nullptr ? kPurgedShare / 2 : 1);
   int64_t bytes_left = limits_.turn_bytes;
   for (;;) {
     if (folders_.empty()) {
       const std::vector<int64_t> gone = FolderTree::GoneAfter(database_, "");
-      if (gone.empty()) break;
+      if (gone.empty()) {
+        purge_.reset();
+        break;
+      }
       folders_ = tree_.AtAndBelow(gone.front());
     }
     const int64_t folder = folders_.back();
@@ -78,11 +113,15 @@ void Clearing::RemoveDocuments(int64_t folder, int64_t& documents_left, int64_t&
   rows.Bind(1, folder).Bind(2, documents_left);
   while (bytes_left > 0 && rows.Step()) {
     documents.push_back(ReadRow(rows, ""));
-    bytes_left -= documents.back().text_bytes;
+    bytes_left -= documents.back().text_bytes / (purge_ != nullptr ? kPurgedShare : 1);
   }
   rows.Reset();
   for (const StoredDocument& stored : documents) {
-    texts_.Remove(stored);
+    if (purge_ != nullptr && purge_->documents.Contains(stored.id)) {
+      database_.Prepare("DELETE FROM bodies WHERE id = ?1").Bind(1, stored.id).Run();
+    } else {
+      texts_.Remove(stored);
+    }
     links_.Forget(stored.id, stored.row);
     database_.Prepare("DELETE FROM docs WHERE id = ?1").Bind(1, stored.id).Run();
     --totals_.clearing;

@@ -1,14 +1,17 @@
 #pragma once
 
 #include <cstdint>
+#include <memory>
 #include <string>
 #include <vector>
 
+#include "services/kovaelasticd/store/doc_set.h"
 #include "services/kovaelasticd/store/file_links.h"
 #include "services/kovaelasticd/store/folder_tree.h"
 #include "services/kovaelasticd/store/sqlite_db.h"
 #include "services/kovaelasticd/store/store_rows.h"
 #include "services/kovaelasticd/store/text_writer.h"
+#include "services/kovaelasticd/store/word_purge.h"
 
 namespace ferrox::engine {
 
@@ -16,12 +19,15 @@ struct ClearingLimits {
   int64_t large = 200;           ///< a folder with so many documents below it is taken out
   int64_t turn_documents = 500;  ///< what a turn takes out at most: some 50 ms of work, since commits wait for it
   int64_t turn_bytes = 1 << 20;  ///< the same, of text
+  int64_t turn_pages = 512;      ///< the same, of full-text tables
+  int64_t purged_part = 16;      ///< from this part of all documents on, their words are taken out together
 };
 
 /// Deletes folders with all below them in two steps. TakeOut, part of the change that deletes, takes the folder out of
 /// the tree and its documents out of the sums, so that from the commit on nobody finds them (HiddenDocuments); names
 /// can be made again at once. Afterwards Turn takes their rows and words out, the folder that was deleted first before
-/// the others, a few documents in each transaction.
+/// the others, a few documents in each transaction. Where they are more than a small part of the index, their words go
+/// before that, by a pass over the full-text tables (WordPurge), which costs less than their texts.
 ///
 /// For the thread that writes; every member throws Error kEngineStorage.
 class Clearing {
@@ -30,8 +36,6 @@ class Clearing {
   Clearing(Database& database, FolderTree& tree, FileLinks& links, TextWriter& texts, Totals& totals)
       : database_(database), tree_(tree), links_(links), texts_(texts), totals_(totals) {}
 
-  /// To be called once the database is ready.
-  void Load();
   /// Whether so much is below the folder that taking it out costs less than removing its documents one by one.
   bool IsLarge(int64_t folder);
   /// Takes the folder out, in the transaction that is open.
@@ -40,9 +44,21 @@ class Clearing {
   void Turn();
   void SetLimits(const ClearingLimits& limits) { limits_ = limits; }
   /// After a rollback.
-  void Forget() { folders_.clear(); }
+  void Forget();
 
  private:
+  /// The documents of all folders that are taken out, when their words are taken out together.
+  struct Purge {
+    explicit Purge(Database& database) : content(database, "content_fts"), meta(database, "meta_fts") {}
+    WordPurge content;
+    WordPurge meta;
+    DocSet documents;
+    bool done = false;
+  };
+
+  void BeginPurge();
+  void ContinuePurge();
+  void RemoveRows();
   void RemoveDocuments(int64_t folder, int64_t& documents_left, int64_t& bytes_left);
 
   Database& database_;
@@ -51,7 +67,9 @@ class Clearing {
   TextWriter& texts_;
   Totals& totals_;
   ClearingLimits limits_;
-  uint64_t last_name_ = 0;        ///< of the folder taken out last; grows as long as the index is open
+  uint64_t last_name_ = 0;  ///< of the folder taken out last
+  std::unique_ptr<Purge> purge_;
+  bool can_purge_ = true;         ///< the full-text tables have the format that WordPurge knows
   std::vector<int64_t> folders_;  ///< the folder that is cleared and those below it, which are still there
 };
 

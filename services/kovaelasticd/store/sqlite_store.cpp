@@ -32,8 +32,6 @@ SqliteStore::SqliteStore(const std::string& path, bool create, std::shared_ptr<c
   places_.Forget();  // what an upgrade has changed is in there
   LoadFieldNames(writer_, names_);
   totals_ = LoadTotals(writer_);
-  clearing_.Load();
-  next_id_ = writer_.QueryInt("SELECT max(id) FROM docs") + 1;
   SyncIndexFolder(Dirname(path));
 }
 

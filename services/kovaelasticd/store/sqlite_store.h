@@ -89,9 +89,6 @@ class SqliteStore : public IndexStore {
   TextWriter texts_{writer_, names_, schema_};
   Totals totals_;  ///< with the changes of the open transaction
   Clearing clearing_{writer_, tree_, links_, texts_, totals_};
-  /// What the next new document gets. None gets the number of one that went while the index was open, since readers
-  /// keep numbers of what is to be cleared.
-  int64_t next_id_ = 1;
   int64_t uncommitted_bytes_ = 0;    ///< for the automatic commit: texts, and a fixed amount for each change
   bool suggestions_wanted_ = false;  ///< once nothing is left to be cleared
   bool in_transaction_ = false;      ///< since the first change after a commit

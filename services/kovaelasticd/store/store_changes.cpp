@@ -45,7 +45,7 @@ void SqliteStore::Changed(int64_t bytes) {
 int64_t SqliteStore::InsertRow(const DocRow& row, int64_t text_bytes) {
   Statement statement =
       writer_.Prepare("INSERT INTO docs VALUES(?1, ?2, ?3, ?4, ?5, ?6, ?7, ?8, ?9, ?10, ?11, ?12, ?13)");
-  const int64_t id = next_id_++;
+  const int64_t id = ++totals_.last_id;
   statement.Bind(1, id);
   BindRow(statement, tree_.Make(FolderTree::FolderOf(row.path)), row, text_bytes);
   statement.Run();
