@@ -75,6 +75,7 @@ class Upgrader {
   }
 
   void Run() {
+    options_.on_turn(0, of_);
     const bool has_tree = format_ >= kTreeFormat;
     const bool cut_words =
         options_.cut_words || format_ < kWordsFormat || (!has_tree && PathsWerePlain(schema_->Mappings()));
