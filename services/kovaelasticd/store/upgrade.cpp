@@ -42,13 +42,11 @@ bool PathsWerePlain(const Json::Value& mappings) {
   return is_plain(field::kPath) || is_plain(field::kParent);
 }
 
-/// The new file is at least as large as the old one.
-void RequireSpace(const std::string& path, int64_t needed) {
+/// Where the system does not say, writing shows it.
+bool HasSpaceFor(const std::string& path, int64_t bytes) {
   struct statvfs volume = {};
-  if (statvfs(path.c_str(), &volume) != 0) return;  // writing shows it
-  const uint64_t free_bytes = uint64_t{volume.f_bavail} * volume.f_frsize;
-  if (free_bytes < static_cast<uint64_t>(needed))
-    throw VolumeFull("there are " + std::to_string(free_bytes >> 20) + " MiB");
+  if (statvfs(path.c_str(), &volume) != 0) return true;
+  return uint64_t{volume.f_bavail} * volume.f_frsize >= static_cast<uint64_t>(bytes);
 }
 
 /// One upgrade. The new file is written without a journal, since it is thrown away when that fails, and synced at each
@@ -208,9 +206,10 @@ void WriteUpgraded(const std::string& path, std::shared_ptr<const Schema> schema
   const base::ScopeExit remove([&] {
     if (!complete) RemoveUpgradeFile(path);
   });
-  const int64_t needed = BytesOnDisk(path) + BytesOnDisk(path + "-wal");
+  const int64_t old_bytes = BytesOnDisk(path) + BytesOnDisk(path + "-wal");
+  const int64_t needed = old_bytes + old_bytes / 16;  // checksums, and what the old format lacks
   try {
-    RequireSpace(path, needed);
+    if (!HasSpaceFor(path, needed)) throw VolumeFull("the volume is full");
     Upgrader(path, std::move(schema), options).Run();
   } catch (const VolumeFull&) {
     Fail({FERROX_SOURCE, __LINE__, __func__, "too little space"}, 0, Error::kEngineStorage,
