@@ -289,6 +289,9 @@ TEST_F(QueueRouterTest, TooManyLinesBecomeComparisonsOfFewFolders) {
   router.Put(Written("/v/single/file"), now_);
   EXPECT_EQ(router.FlushAll(now_), "");
   EXPECT_EQ(Lines(queue_), "10000 /top/ 10000 /v/wide/ 10000 /w/a/ 2 /v/single/file ");
+  for (int i = 0; i < 1000; ++i) router.Put(Attributes("/v/" + std::to_string(i)), now_);
+  EXPECT_EQ(router.FlushAll(now_), "");
+  EXPECT_NE(Lines(queue_).find("4 /v/0 4 /v/1 "), std::string::npos) << "rights are not to wait for a comparison";
 }
 
 TEST_F(QueueRouterTest, PathsThatNobodyCanOpenAreReportedByTheFolderAboveThem) {

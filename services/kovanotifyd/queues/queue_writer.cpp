@@ -40,7 +40,8 @@ constexpr milliseconds kLockPause{5};
 QueueWriter::QueueWriter(std::string path, const Limits& limits)
     : path_(std::move(path)),
       bytes_max_(limits.bytes),
-      outbox_(static_cast<size_t>(std::min<uint64_t>(limits.lines, SIZE_MAX))) {}
+      lines_max_(static_cast<size_t>(std::min<uint64_t>(limits.lines, SIZE_MAX))),
+      outbox_(lines_max_) {}
 
 void QueueWriter::NoteArrival() {
   if (oldest_ == 0 && Waiting() > 0) oldest_ = Clock::Get().Now();
@@ -49,6 +50,9 @@ void QueueWriter::NoteArrival() {
 void QueueWriter::Add(uint32_t event, const WatchedName& name, uint32_t mask) {
   outbox_.Add(event, name, mask);
   NoteArrival();
+  // Before they would be replaced by comparisons, which nobody carries out ahead of a long pass.
+  const bool are_many_rights = event == fileindex::EVENT_ATTR && outbox_.Size() >= lines_max_ / 2;
+  if (are_many_rights && reason_.empty()) NoteOutcome(Append(), std::chrono::steady_clock::now());
 }
 
 void QueueWriter::AddRename(const WatchedName& old_name, const WatchedName& name) {

@@ -37,7 +37,8 @@ class QueueWriter {
 
   const std::string& Path() const { return path_; }
 
-  // Adding lines. Nothing is written before Flush or FlushAll.
+  // Adding lines. Nothing is written before Flush or FlushAll, but for changes of rights, of which so many come at once
+  // that they would have to be replaced by comparisons.
 
   /// As QueueOutbox::Add.
   void Add(uint32_t event, const WatchedName& name, uint32_t mask);
@@ -70,6 +71,7 @@ class QueueWriter {
 
   std::string path_;
   uint64_t bytes_max_;
+  size_t lines_max_;
   QueueOutbox outbox_;
   std::set<uint64_t> files_ = {};  ///< numbers of changed files, for one line together,
   std::string files_folder_ = {};  ///< whose path is this watched folder
