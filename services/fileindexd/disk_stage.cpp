@@ -1,7 +1,10 @@
 #include "services/fileindexd/disk_stage.h"
 
 #include <fcntl.h>
+#include <linux/capability.h>
 #include <sys/stat.h>
+#include <sys/syscall.h>
+#include <unistd.h>
 
 #include "base/path.h"
 #include "base/unique_fd.h"
@@ -12,6 +15,17 @@
 namespace ferrox::indexd {
 
 using Place = PathRules::Place;
+
+namespace {
+
+/// Whether this thread reads every folder whatever its permissions: then none becomes readable by a change of these.
+bool MayReadAllFolders() {
+  __user_cap_header_struct header = {_LINUX_CAPABILITY_VERSION_3, 0};
+  __user_cap_data_struct sets[_LINUX_CAPABILITY_U32S_3] = {};
+  return syscall(SYS_capget, &header, sets) == 0 && (sets[0].effective & (1U << CAP_DAC_READ_SEARCH)) != 0;
+}
+
+}  // namespace
 
 struct DiskStage::Handler {
   fileindex::FileIndexOP op;
@@ -33,6 +47,7 @@ DiskStage::DiskStage(const PassContext& context, PathRules& rules, DocumentWrite
       rules_(rules),
       writer_(writer),
       commits_(commits),
+      reads_all_folders_(MayReadAllFolders()),
       tasks_(context.share.environment.pool, context.share.interruption),
       access_(tasks_, writer),
       comparer_(context, rules, writer, commits, tasks_, access_) {}
@@ -61,11 +76,12 @@ void DiskStage::Upsert(const std::string& path, const std::string&) {
 void DiskStage::Attr(const std::string& path, const std::string&) {
   writer_.WillChange();  // so that the commit records the folders that have no documents: one of them may be meant
   if (path == context_.share.root) return;
-  const Place place = rules_.PlaceOf(path);
   struct stat status = {};
+  const bool is_folder = PresenceOf(path, status) == Presence::kThere && S_ISDIR(status.st_mode);
+  const Place place = rules_.PlaceOf(path, is_folder);
   if (place == Place::kOutside) {
     tasks_.Submit([this, path] { writer_.Remove(path); });
-  } else if (PresenceOf(path, status) == Presence::kThere && BecameReadable(path, status)) {
+  } else if (is_folder && !reads_all_folders_ && BecameReadable(path)) {
     comparer_.Compare(path);
   } else if (place == Place::kIndexed) {
     access_.Add(path);
@@ -102,9 +118,8 @@ void DiskStage::FullReindex(const std::string&, const std::string&) {
 }
 
 /// Whether this is a folder that can be read and of which the index knows no content: its permissions may just have
-/// been opened.
-bool DiskStage::BecameReadable(const std::string& folder, const struct stat& status) const {
-  if (!S_ISDIR(status.st_mode)) return false;
+/// been opened. A request each, so not asked where that cannot be.
+bool DiskStage::BecameReadable(const std::string& folder) const {
   const base::UniqueFd opened(open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
   return opened.Valid() && context_.index.List(folder, "", 1).empty();
 }

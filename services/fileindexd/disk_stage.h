@@ -54,12 +54,13 @@ class DiskStage {
   void Rename(const std::string& path, const std::string& old_path);
   void Reindex(const std::string& path, const std::string& old_path);
   void FullReindex(const std::string& path, const std::string& old_path);
-  bool BecameReadable(const std::string& folder, const struct stat& status) const;
+  bool BecameReadable(const std::string& folder) const;
 
   const PassContext& context_;
   PathRules& rules_;
   DocumentWriter& writer_;
   PassCommits& commits_;
+  const bool reads_all_folders_;
   bool had_reindex_ = false;
   TaskGroup tasks_;
   AccessBatch access_;

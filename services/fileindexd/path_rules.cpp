@@ -52,15 +52,19 @@ PathRules::PathRules(const std::string& share, const std::string& root, const Sh
 bool PathRules::SkipName(const std::string& name) { return fileindex::IsSystemPreservedFileName(name); }
 
 PathRules::Place PathRules::PlaceOf(const std::string& path) {
-  const Place place = folders_.PlaceOf(path);
-  return place == Place::kOutside || IsLeftOut(path) ? Place::kOutside : place;
+  if (folders_.PlaceOf(path) == Place::kOutside) return Place::kOutside;
+  struct stat status = {};
+  return PlaceOf(path, lstat(path.c_str(), &status) == 0 && S_ISDIR(status.st_mode));
 }
 
-bool PathRules::IsLeftOut(const std::string& path) {
+PathRules::Place PathRules::PlaceOf(const std::string& path, bool is_folder) {
+  const Place place = folders_.PlaceOf(path);
+  return place == Place::kOutside || IsLeftOut(path, is_folder) ? Place::kOutside : place;
+}
+
+bool PathRules::IsLeftOut(const std::string& path, bool is_folder) {
   if (path == root_) return false;
   if (!base::IsBelow(path, root_)) return true;
-  struct stat status = {};
-  const bool is_folder = lstat(path.c_str(), &status) == 0 && S_ISDIR(status.st_mode);
   return is_folder ? FolderIsLeftOut(path) : SkipName(Basename(path)) || FolderIsLeftOut(Dirname(path));
 }
 

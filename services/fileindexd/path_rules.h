@@ -25,6 +25,8 @@ class PathRules {
 
   /// What the path, at or below the root, is for the index by its name and place. Nothing need exist there.
   Place PlaceOf(const std::string& path);
+  /// The same, when it is known whether a folder is there.
+  Place PlaceOf(const std::string& path, bool is_folder);
   bool CanBeIndexed(const std::string& path) { return PlaceOf(path) == Place::kIndexed; }
   /// Whether a name is never indexed, nor anything below it.
   static bool SkipName(const std::string& name);
@@ -32,7 +34,7 @@ class PathRules {
   bool MayEnter(const std::string& path, const struct stat& status, dev_t parent_device) const;
 
  private:
-  bool IsLeftOut(const std::string& path);
+  bool IsLeftOut(const std::string& path, bool is_folder);
   bool FolderIsLeftOut(const std::string& folder);
 
   std::string share_;
