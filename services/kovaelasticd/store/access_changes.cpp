@@ -11,23 +11,6 @@ namespace names = fileindex::elastic;
 
 }  // namespace
 
-/// To be called when a row is written (`before` null: it is new) or removed (`after` null). Keeps the sum, and the
-/// record of the folder whose own document it is.
-void SqliteStore::CountAccess(const DocRow* before, const DocRow* after) {
-  const auto lacks = [](const DocRow* row) { return row != nullptr && row->access == AccessRecords::kNone ? 1 : 0; };
-  totals_.without_access += lacks(after) - lacks(before);
-  const bool was_folder = before != nullptr && before->kind == kFolder;
-  const bool is_folder = after != nullptr && after->kind == kFolder;
-  if (was_folder && !(is_folder && before->path == after->path)) GiveFolder(before->path, AccessRecords::kNone);
-  if (is_folder) GiveFolder(after->path, after->access);
-}
-
-/// If there is a folder at `path`, it gets the record.
-void SqliteStore::GiveFolder(const std::string& path, int64_t access) {
-  const int64_t folder = tree_.Find(path + "/");
-  if (folder != FolderTree::kNone) tree_.SetAccess(folder, access);
-}
-
 /// One call of SetAccess. Neighbours mostly lie in one folder and have one record, so that both are looked up once for
 /// them. Rows are written without a look at their words, since no member that is set here makes any; where one does,
 /// the document goes the long way.
@@ -35,12 +18,14 @@ class SqliteStore::AccessPass {
  public:
   explicit AccessPass(SqliteStore& store)
       : store_(store),
-        stamp_field_(store.names_.NumberOf(FileLinks::kStamp)),
-        owner_field_(store.names_.NumberOf(names::kKOVAMDOwnerUserID)),
-        group_field_(store.names_.NumberOf(names::kKOVAMDOwnerGroupID)),
-        changed_field_(store.names_.NumberOf(names::kKOVAMDAttributeChangeDate)),
-        find_(store.writer_.Prepare("SELECT id, kind, access, packed FROM docs WHERE folder = ?1 AND leaf = ?2")),
-        write_(store.writer_.Prepare("UPDATE docs SET access = ?2, packed = ?3 WHERE id = ?1")) {
+        catalogue_(store.catalogue_),
+        stamp_field_(catalogue_.Names().NumberOf(FileLinks::kStamp)),
+        owner_field_(catalogue_.Names().NumberOf(names::kKOVAMDOwnerUserID)),
+        group_field_(catalogue_.Names().NumberOf(names::kKOVAMDOwnerGroupID)),
+        changed_field_(catalogue_.Names().NumberOf(names::kKOVAMDAttributeChangeDate)),
+        find_(catalogue_.Connection().Prepare(
+            "SELECT id, kind, access, packed FROM docs WHERE folder = ?1 AND leaf = ?2")),
+        write_(catalogue_.Connection().Prepare("UPDATE docs SET access = ?2, packed = ?3 WHERE id = ?1")) {
     changed_has_words_ = store.schema_->IsPlain(names::kKOVAMDAttributeChangeDate);
   }
 
@@ -49,7 +34,7 @@ class SqliteStore::AccessPass {
     LookUpRecord(change.access);
     Row row;
     if (!Find(change.path, row)) {
-      store_.GiveFolder(change.path, access_);
+      catalogue_.GiveFolder(change.path, access_);
       return Found::kMissing;
     }
     const auto stored = FileStamp::Parse(TextField(row.packed, stamp_field_).value_or(""));
@@ -64,7 +49,7 @@ class SqliteStore::AccessPass {
       ReplaceField(packed, stamp_field_, change.stamp);
       ReplaceField(packed, changed_field_, Json::Int64(seen->ChangedSec()));
       Write(row, packed, change);
-      if (!row.is_folder) store_.links_.OnSeen(row.id, change.stamp);
+      if (!row.is_folder) catalogue_.Links().OnSeen(row.id, change.stamp);
     }
     return same ? Found::kSame : Found::kDiffering;
   }
@@ -79,7 +64,7 @@ class SqliteStore::AccessPass {
 
   void LookUpRecord(const std::string& text) {
     if (text == access_text_) return;
-    access_ = store_.access_.NumberOf(text);
+    access_ = catalogue_.Access().NumberOf(text);
     access_text_ = text;
     const size_t colon = text.find(':');
     owner_ = text.substr(0, colon);
@@ -89,7 +74,7 @@ class SqliteStore::AccessPass {
   bool Find(const std::string& path, Row& row) {
     const std::string_view folder_path = FolderTree::FolderOf(path);
     if (folder_path != folder_path_) {
-      folder_ = store_.tree_.Find(folder_path);
+      folder_ = catalogue_.Tree().Find(folder_path);
       folder_path_ = folder_path;
     }
     find_.Bind(1, folder_).Bind(2, FolderTree::LeafOf(path));
@@ -118,12 +103,13 @@ class SqliteStore::AccessPass {
   void Write(const Row& row, const std::string& packed, const AccessChange& change) {
     if (row.access == access_ && row.packed == packed) return;
     write_.Bind(1, row.id).Bind(2, access_).BindBlob(3, packed).Run();
-    store_.totals_.without_access -= row.access == AccessRecords::kNone ? 1 : 0;
-    if (row.is_folder) store_.GiveFolder(change.path, access_);
+    catalogue_.Sums().without_access -= row.access == AccessRecords::kNone ? 1 : 0;
+    if (row.is_folder) catalogue_.GiveFolder(change.path, access_);
     store_.Changed(0);
   }
 
   SqliteStore& store_;
+  Catalogue& catalogue_;
   const int64_t stamp_field_, owner_field_, group_field_, changed_field_;  ///< in packed fields; 0: nobody has it
   bool changed_has_words_;
   Statement find_, write_;
@@ -134,7 +120,7 @@ class SqliteStore::AccessPass {
 };
 
 AccessReport SqliteStore::SetAccess(const std::vector<AccessChange>& changes) {
-  Begin();
+  catalogue_.Begin();
   AccessPass pass(*this);
   AccessReport report;
   for (size_t i = 0; i < changes.size(); ++i) {

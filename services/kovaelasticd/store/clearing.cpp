@@ -53,17 +53,17 @@ void Clearing::TakeOut(int64_t folder) {
 
 void Clearing::Forget() {
   folders_.clear();
-  purge_.reset();
+  EndPurge();
 }
 
 void Clearing::Turn() {
   const bool is_large_part = totals_.clearing * limits_.purged_part >= totals_.documents + totals_.clearing;
-  if (purge_ == nullptr && folders_.empty() && can_purge_ && is_large_part) BeginPurge();
-  purge_ != nullptr && !purge_->done ? ContinuePurge() : RemoveRows();
+  if (!purge_.has_value() && folders_.empty() && can_purge_ && is_large_part) BeginPurge();
+  purge_.has_value() && !purge_->done ? ContinuePurge() : RemoveRows();
 }
 
 void Clearing::BeginPurge() {
-  purge_ = std::make_unique<Purge>(database_);
+  purge_.emplace();
   Statement documents = database_.Prepare("SELECT id FROM docs WHERE folder = ?1");
   for (const int64_t gone : FolderTree::GoneAfter(database_, "")) {
     for (const int64_t folder : tree_.AtAndBelow(gone)) {
@@ -74,24 +74,27 @@ void Clearing::BeginPurge() {
 }
 
 void Clearing::ContinuePurge() {
-  int64_t pages = limits_.turn_pages;
-  WordPurge::Result result = purge_->content.Turn(purge_->documents, pages);
-  if (result == WordPurge::Result::kDone) result = purge_->meta.Turn(purge_->documents, pages);
-  purge_->done = result == WordPurge::Result::kDone;
-  if (result != WordPurge::Result::kUnknownFormat) return;
+  const Words::Purged purged = words_.Purge(purge_->documents, limits_.turn_pages);
+  purge_->done = purged == Words::Purged::kDone;
+  if (purged != Words::Purged::kImpossible) return;
   can_purge_ = false;
+  EndPurge();
+}
+
+void Clearing::EndPurge() {
   purge_.reset();
+  words_.EndPurge();
 }
 
 /// With the words of those that were not purged.
 void Clearing::RemoveRows() {
-  int64_t documents_left = limits_.turn_documents * (purge_ != nullptr ? kPurgedShare / 2 : 1);
+  int64_t documents_left = limits_.turn_documents * (purge_.has_value() ? kPurgedShare / 2 : 1);
   int64_t bytes_left = limits_.turn_bytes;
   for (;;) {
     if (folders_.empty()) {
       const std::vector<int64_t> gone = FolderTree::GoneAfter(database_, "");
       if (gone.empty()) {
-        purge_.reset();
+        EndPurge();
         break;
       }
       folders_ = tree_.AtAndBelow(gone.front());
@@ -103,7 +106,7 @@ void Clearing::RemoveRows() {
     database_.Prepare("DELETE FROM folders WHERE id = ?1").Bind(1, folder).Run();
     folders_.pop_back();
   }
-  texts_.Flush();
+  words_.Flush();
 }
 
 void Clearing::RemoveDocuments(int64_t folder, int64_t& documents_left, int64_t& bytes_left) {
@@ -113,14 +116,14 @@ void Clearing::RemoveDocuments(int64_t folder, int64_t& documents_left, int64_t&
   rows.Bind(1, folder).Bind(2, documents_left);
   while (bytes_left > 0 && rows.Step()) {
     documents.push_back(ReadRow(rows, ""));
-    bytes_left -= documents.back().text_bytes / (purge_ != nullptr ? kPurgedShare : 1);
+    bytes_left -= documents.back().text_bytes / (purge_.has_value() ? kPurgedShare : 1);
   }
   rows.Reset();
   for (const StoredDocument& stored : documents) {
-    if (purge_ != nullptr && purge_->documents.Contains(stored.id)) {
-      database_.Prepare("DELETE FROM bodies WHERE id = ?1").Bind(1, stored.id).Run();
+    if (purge_.has_value() && purge_->documents.Contains(stored.id)) {
+      words_.RemovePurged(stored.id);
     } else {
-      texts_.Remove(stored);
+      words_.Remove(stored);
     }
     links_.Forget(stored.id, stored.row);
     database_.Prepare("DELETE FROM docs WHERE id = ?1").Bind(1, stored.id).Run();

@@ -1,17 +1,13 @@
 #pragma once
 
 #include <cstdint>
-#include <memory>
+#include <optional>
 #include <string>
 #include <vector>
 
+#include "services/kovaelasticd/store/catalogue.h"
 #include "services/kovaelasticd/store/doc_set.h"
-#include "services/kovaelasticd/store/file_links.h"
-#include "services/kovaelasticd/store/folder_tree.h"
-#include "services/kovaelasticd/store/sqlite_db.h"
-#include "services/kovaelasticd/store/store_rows.h"
-#include "services/kovaelasticd/store/text_writer.h"
-#include "services/kovaelasticd/store/word_purge.h"
+#include "services/kovaelasticd/store/words.h"
 
 namespace ferrox::engine {
 
@@ -27,14 +23,18 @@ struct ClearingLimits {
 /// the tree and its documents out of the sums, so that from the commit on nobody finds them (HiddenDocuments); names
 /// can be made again at once. Afterwards Turn takes their rows and words out, the folder that was deleted first before
 /// the others, a few documents in each transaction. Where they are more than a small part of the index, their words go
-/// before that, by a pass over the full-text tables (WordPurge), which costs less than their texts.
+/// before that, all together (Words::Purge), which costs less.
 ///
 /// For the thread that writes; every member throws Error kEngineStorage.
 class Clearing {
  public:
-  /// All outlive this. `totals` are those of the writer.
-  Clearing(Database& database, FolderTree& tree, FileLinks& links, TextWriter& texts, Totals& totals)
-      : database_(database), tree_(tree), links_(links), texts_(texts), totals_(totals) {}
+  /// Both outlive this.
+  Clearing(Catalogue& catalogue, Words& words)
+      : database_(catalogue.Connection()),
+        tree_(catalogue.Tree()),
+        links_(catalogue.Links()),
+        totals_(catalogue.Sums()),
+        words_(words) {}
 
   /// Whether so much is below the folder that taking it out costs less than removing its documents one by one.
   bool IsLarge(int64_t folder);
@@ -47,29 +47,27 @@ class Clearing {
   void Forget();
 
  private:
-  /// The documents of all folders that are taken out, when their words are taken out together.
+  /// Documents whose words are taken out together.
   struct Purge {
-    explicit Purge(Database& database) : content(database, "content_fts"), meta(database, "meta_fts") {}
-    WordPurge content;
-    WordPurge meta;
     DocSet documents;
     bool done = false;
   };
 
   void BeginPurge();
   void ContinuePurge();
+  void EndPurge();
   void RemoveRows();
   void RemoveDocuments(int64_t folder, int64_t& documents_left, int64_t& bytes_left);
 
   Database& database_;
   FolderTree& tree_;
   FileLinks& links_;
-  TextWriter& texts_;
   Totals& totals_;
+  Words& words_;
   ClearingLimits limits_;
   uint64_t last_name_ = 0;  ///< of the folder taken out last
-  std::unique_ptr<Purge> purge_;
-  bool can_purge_ = true;         ///< the full-text tables have the format that WordPurge knows
+  std::optional<Purge> purge_;
+  bool can_purge_ = true;
   std::vector<int64_t> folders_;  ///< the folder that is cleared and those below it, which are still there
 };
 

@@ -30,73 +30,38 @@ std::string_view WithoutMarks(std::string_view text) {
 
 }  // namespace
 
-void SqliteStore::CountText(int64_t before, int64_t after) {
-  totals_.text_bytes += after - before;
-  totals_.with_content += (after > 0 ? 1 : 0) - (before > 0 ? 1 : 0);
-}
-
-/// To be called after each change, with the bytes of text that it changed.
 void SqliteStore::Changed(int64_t bytes) {
   uncommitted_bytes_ += bytes + kRowBytes;
-  texts_.Changed(bytes);
-  if (places_.IsFull()) places_.Flush(totals_.version + 1);
-}
-
-int64_t SqliteStore::InsertRow(const DocRow& row, int64_t text_bytes) {
-  Statement statement =
-      writer_.Prepare("INSERT INTO docs VALUES(?1, ?2, ?3, ?4, ?5, ?6, ?7, ?8, ?9, ?10, ?11, ?12, ?13)");
-  const int64_t id = ++totals_.last_id;
-  statement.Bind(1, id);
-  BindRow(statement, tree_.Make(FolderTree::FolderOf(row.path)), row, text_bytes);
-  statement.Run();
-  ++totals_.documents;
-  CountText(0, text_bytes);
-  CountAccess(nullptr, &row);
-  return id;
-}
-
-void SqliteStore::UpdateRow(const StoredDocument& before, const DocRow& row, int64_t text_bytes) {
-  const int64_t folder = tree_.Make(FolderTree::FolderOf(row.path));
-  Statement statement = writer_.Prepare(
-      "UPDATE docs SET folder = ?2, leaf = ?3, name = ?4, ext = ?5, kind = ?6, size = ?7, mtime = ?8, text_bytes = ?9,"
-      " derived = ?10, error = ?11, packed = ?12, access = ?13 WHERE id = ?1");
-  statement.Bind(1, before.id);
-  BindRow(statement, folder, row, text_bytes);
-  statement.Run();
-  if (folder != before.folder) tree_.Prune(before.folder);
-  CountAccess(&before.row, &row);
+  words_.Changed(bytes);
+  catalogue_.Relieve();
 }
 
 void SqliteStore::Upsert(const std::string& path, const Json::Value& document) {
-  Begin();
-  AddFieldNames(writer_, names_, document);
+  catalogue_.Begin();
+  AddFieldNames(catalogue_.Connection(), catalogue_.Names(), document);
   const std::string_view text = WithoutMarks(TextOf(document));
-  DocRow row = PackDocument(path, document, names_);
-  row.access = access_.NumberOf(document[field::kAccess]);
+  DocRow row = PackDocument(path, document, catalogue_.Names());
+  row.access = catalogue_.Access().NumberOf(document[field::kAccess]);
   const auto text_bytes = static_cast<int64_t>(text.size());
-  const std::optional<StoredDocument> before = FindDocument(writer_, tree_, path);
+  const std::optional<StoredDocument> before = catalogue_.Find(path);
   MetaText meta = MakeMetaText(row, document, *schema_);
   if (before.has_value()) {
-    texts_.Replace(*before, std::move(meta), text);
-    UpdateRow(*before, row, text_bytes);
-    CountText(before->text_bytes, text_bytes);
-    links_.OnChange(before->id, &before->row, &row);
+    words_.Replace(*before, std::move(meta), text);
+    catalogue_.Update(*before, row, text_bytes, true);
   } else {
-    const int64_t id = InsertRow(row, text_bytes);
-    texts_.Add(id, std::move(meta), text);
-    links_.OnChange(id, nullptr, &row);
+    words_.Add(catalogue_.Insert(row, text_bytes), std::move(meta), text);
   }
   Changed(text_bytes);
 }
 
 void SqliteStore::Set(const std::string& path, const Json::Value& changes) {
-  const std::optional<StoredDocument> before = FindDocument(writer_, tree_, path);
+  const std::optional<StoredDocument> before = catalogue_.Find(path);
   if (!before.has_value()) throw Error(Error::kEngineNoSuchDocument, "there is no document \"" + path + "\" to change");
-  Begin();
+  catalogue_.Begin();
   const int64_t access =
-      changes.isMember(field::kAccess) ? access_.NumberOf(changes[field::kAccess]) : before->row.access;
-  AddFieldNames(writer_, names_, changes);
-  Json::Value document = UnpackDocument(before->row, names_, {});
+      changes.isMember(field::kAccess) ? catalogue_.Access().NumberOf(changes[field::kAccess]) : before->row.access;
+  AddFieldNames(catalogue_.Connection(), catalogue_.Names(), changes);
+  Json::Value document = UnpackDocument(before->row, catalogue_.Names(), {});
   for (auto member = changes.begin(); member != changes.end(); ++member) {
     if (member->isNull()) {
       document.removeMember(member.name());
@@ -106,32 +71,31 @@ void SqliteStore::Set(const std::string& path, const Json::Value& changes) {
   }
   const std::string new_path = document[field::kPath].isString() ? document[field::kPath].asString() : path;
   if (new_path != path) RemoveAt(new_path);
-  DocRow row = PackDocument(new_path, document, names_);
+  DocRow row = PackDocument(new_path, document, catalogue_.Names());
   row.access = access;
   const bool text_changed = changes.isMember(field::kTextContent);
   const std::string_view text = WithoutMarks(TextOf(changes));
   const int64_t text_bytes = text_changed ? static_cast<int64_t>(text.size()) : before->text_bytes;
-  texts_.Replace(*before, MakeMetaText(row, document, *schema_), text_changed ? std::optional(text) : std::nullopt);
-  UpdateRow(*before, row, text_bytes);
-  CountText(before->text_bytes, text_bytes);
+  words_.Replace(*before, MakeMetaText(row, document, *schema_), text_changed ? std::optional(text) : std::nullopt);
   // A document that only moves says nothing new about its file.
-  if (changes.isMember(FileLinks::kStamp)) links_.OnChange(before->id, &before->row, &row);
+  catalogue_.Update(*before, row, text_bytes, changes.isMember(FileLinks::kStamp));
   Changed(text_changed ? text_bytes : 0);
 }
 
 void SqliteStore::MoveFolder(const std::string& path, const std::string& stamp, const Json::Value& changes) {
   if (!stamp.empty()) {
-    const std::optional<StoredDocument> there = FindDocument(writer_, tree_, path);
-    const bool same =
-        there.has_value() && UnpackDocument(there->row, names_, {FileLinks::kStamp})[FileLinks::kStamp] == stamp;
+    const std::optional<StoredDocument> there = catalogue_.Find(path);
+    const bool same = there.has_value() &&
+                      UnpackDocument(there->row, catalogue_.Names(), {FileLinks::kStamp})[FileLinks::kStamp] == stamp;
     if (!same)
       throw Error(Error::kEngineNoSuchDocument, "there is no document \"" + path + "\" with that stamp to move");
   }
   Set(path, changes);
   const std::string from = path + "/", to = changes[field::kPath].asString() + "/";
-  const int64_t folder = tree_.Find(from);
+  FolderTree& tree = catalogue_.Tree();
+  const int64_t folder = tree.Find(from);
   if (folder == FolderTree::kNone) return;
-  tree_.Find(to) == FolderTree::kNone ? tree_.Move(folder, to) : MoveOneByOne(from, to);
+  tree.Find(to) == FolderTree::kNone ? tree.Move(folder, to) : MoveOneByOne(from, to);
 }
 
 /// Where both folders have documents below them, one may take another's place.
@@ -139,7 +103,7 @@ void SqliteStore::MoveOneByOne(const std::string& from, const std::string& to) {
   std::vector<std::string> paths;
   do {
     paths.clear();
-    PathWalk walk(writer_, tree_, from, "");
+    PathWalk walk(catalogue_.Connection(), catalogue_.Tree(), from, "");
     while (paths.size() < kStep && walk.Next()) paths.push_back(walk.Document().row.path);
     Json::Value change;
     for (const std::string& path : paths) {
@@ -153,33 +117,29 @@ void SqliteStore::MoveOneByOne(const std::string& from, const std::string& to) {
 
 /// Removes the document at `path`, if there is one.
 void SqliteStore::RemoveAt(const std::string& path) {
-  const std::optional<StoredDocument> there = FindDocument(writer_, tree_, path);
+  const std::optional<StoredDocument> there = catalogue_.Find(path);
   if (there.has_value()) Remove(*there);
 }
 
 void SqliteStore::Remove(const StoredDocument& stored) {
-  texts_.Remove(stored);
-  writer_.Prepare("DELETE FROM docs WHERE id = ?1").Bind(1, stored.id).Run();
-  tree_.Prune(stored.folder);
-  links_.OnChange(stored.id, &stored.row, nullptr);
-  --totals_.documents;
-  CountAccess(&stored.row, nullptr);
-  CountText(stored.text_bytes, 0);
+  words_.Remove(stored);
+  catalogue_.Remove(stored);
   Changed(stored.text_bytes);
 }
 
 void SqliteStore::Delete(const std::string& path) {
-  Begin();
+  catalogue_.Begin();
   RemoveAt(path);
 }
 
 void SqliteStore::DeletePrefix(const std::string& prefix) {
-  Begin();
-  const int64_t folder = tree_.Find(FolderTree::FolderOf(prefix));
+  catalogue_.Begin();
+  FolderTree& tree = catalogue_.Tree();
+  const int64_t folder = tree.Find(FolderTree::FolderOf(prefix));
   if (folder == FolderTree::kNone) return;
   const std::string begin(FolderTree::LeafOf(prefix));
   const bool whole = begin.empty() && folder != FolderTree::kTop;
-  for (const int64_t each : whole ? std::vector<int64_t>{folder} : tree_.ChildrenOf(folder, begin)) {
+  for (const int64_t each : whole ? std::vector<int64_t>{folder} : tree.ChildrenOf(folder, begin)) {
     if (!clearing_.IsLarge(each)) continue;
     clearing_.TakeOut(each);
     Changed(0);
@@ -191,7 +151,7 @@ void SqliteStore::RemoveOneByOne(const std::string& prefix) {
   std::vector<StoredDocument> found;
   do {
     found.clear();
-    PathWalk walk(writer_, tree_, prefix, "");
+    PathWalk walk(catalogue_.Connection(), catalogue_.Tree(), prefix, "");
     while (found.size() < kStep && walk.Next()) found.push_back(walk.Document());
     for (const StoredDocument& stored : found) Remove(stored);
   } while (!found.empty());

@@ -19,11 +19,11 @@
 #include "services/kovaelasticd/store/index_files.h"
 #include "services/kovaelasticd/store/place_writer.h"
 #include "services/kovaelasticd/store/sqlite_db.h"
+#include "services/kovaelasticd/store/sqlite_words.h"
 #include "services/kovaelasticd/store/store_format.h"
 #include "services/kovaelasticd/store/store_rows.h"
 #include "services/kovaelasticd/store/store_stat.h"
 #include "services/kovaelasticd/store/text_codec.h"
-#include "services/kovaelasticd/store/text_writer.h"
 
 namespace ferrox::engine {
 
@@ -152,7 +152,7 @@ class Upgrader {
     tree_.Forget();
     done_ = 0;
     counts_documents_ = true;
-    TextWriter texts(to_, names_, schema_);
+    SqliteWords words(to_, names_, schema_);
     TextCodec codec;
     static const std::string rows_sql = std::string(kSelectRow) + "ORDER BY id";
     Statement rows = to_.Prepare(rows_sql);
@@ -163,12 +163,12 @@ class Upgrader {
       if (stored.text_bytes > 0 && body.Bind(1, stored.id).Step()) text = codec.Unpack(body.Text(0));
       body.Reset();
       if (static_cast<int64_t>(text.size()) != stored.text_bytes) to_.Fail(SQLITE_CORRUPT);
-      texts.Add(stored.id, MakeMetaText(stored.row, UnpackDocument(stored.row, names_, {}), *schema_), text);
-      texts.Changed(stored.text_bytes);
+      words.Add(stored.id, MakeMetaText(stored.row, UnpackDocument(stored.row, names_, {}), *schema_), text);
+      words.Changed(stored.text_bytes);
       ++done_;
       Count(stored.text_bytes);
     }
-    texts.Flush();
+    words.Flush();
   }
 
   /// To be called after each row; ends a turn where it is long enough.

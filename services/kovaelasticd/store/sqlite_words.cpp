@@ -1,4 +1,6 @@
-#include "services/kovaelasticd/store/text_writer.h"
+#include "services/kovaelasticd/store/sqlite_words.h"
+
+#include "services/kovaelasticd/store/suggest.h"
 
 namespace ferrox::engine {
 
@@ -17,7 +19,7 @@ std::optional<std::string> TextOrNone(std::string_view text) {
 }  // namespace
 
 /// The document's entry, made from what is stored when it has none.
-TextWriter::Pending& TextWriter::PendingOf(const StoredDocument& stored) {
+SqliteWords::Pending& SqliteWords::PendingOf(const StoredDocument& stored) {
   const auto [place, made] = pending_.try_emplace(stored.id);
   if (made) {
     const Json::Value document = UnpackDocument(stored.row, names_, {});
@@ -27,7 +29,7 @@ TextWriter::Pending& TextWriter::PendingOf(const StoredDocument& stored) {
   return place->second;
 }
 
-void TextWriter::Add(int64_t id, MetaText meta, std::string_view text) {
+void SqliteWords::Add(int64_t id, MetaText meta, std::string_view text) {
   // A number may be that of a document removed just now, whose words are still to be removed.
   Pending& pending = pending_[id];
   pending.new_meta = std::move(meta);
@@ -35,7 +37,7 @@ void TextWriter::Add(int64_t id, MetaText meta, std::string_view text) {
   pending.text = TextOrNone(text);
 }
 
-void TextWriter::Replace(const StoredDocument& before, MetaText meta, std::optional<std::string_view> text) {
+void SqliteWords::Replace(const StoredDocument& before, MetaText meta, std::optional<std::string_view> text) {
   Pending& pending = PendingOf(before);
   pending.new_meta = std::move(meta);
   if (text.has_value()) {
@@ -46,32 +48,32 @@ void TextWriter::Replace(const StoredDocument& before, MetaText meta, std::optio
   }
 }
 
-void TextWriter::Remove(const StoredDocument& before) {
+void SqliteWords::Remove(const StoredDocument& before) {
   Pending& pending = PendingOf(before);
   pending.new_meta.reset();
   pending.text_changed = true;
   pending.text.reset();
 }
 
-void TextWriter::Changed(int64_t bytes) {
+void SqliteWords::Changed(int64_t bytes) {
   pending_bytes_ += bytes;
   const bool ids_grow = !pending_.empty() && pending_.begin()->first > last_written_;
   if (pending_bytes_ >= (ids_grow ? kPendingNewMaxBytes : kPendingMaxBytes)) Flush();
 }
 
-std::string TextWriter::Text(int64_t id) {
+std::string SqliteWords::Text(int64_t id) {
   const auto waiting = pending_.find(id);
   const bool waits = waiting != pending_.end() && waiting->second.text_changed;
   return waits ? waiting->second.text.value_or("") : StoredText(id);
 }
 
-std::string TextWriter::StoredText(int64_t id) {
+std::string SqliteWords::StoredText(int64_t id) {
   Statement statement = database_.Prepare("SELECT zstd FROM bodies WHERE id = ?1");
   statement.Bind(1, id);
   return statement.Step() ? std::string(codec_.Unpack(statement.Text(0))) : std::string();
 }
 
-void TextWriter::Flush() {
+void SqliteWords::Flush() {
   for (const auto& [id, pending] : pending_) {
     if (pending.text_changed) WriteText(id, pending);
   }
@@ -81,13 +83,28 @@ void TextWriter::Flush() {
   pending_bytes_ = 0;
 }
 
-void TextWriter::Forget() {
+void SqliteWords::Forget() {
   pending_.clear();
   pending_bytes_ = 0;
+  purges_.reset();
 }
 
+void SqliteWords::RebuildSuggestions() { engine::RebuildSuggestions(database_); }
+
+Words::Purged SqliteWords::Purge(const DocSet& documents, int64_t pages) {
+  if (purges_ == nullptr) purges_ = std::make_unique<Purges>(database_);
+  WordPurge::Result result = purges_->content.Turn(documents, pages);
+  if (result == WordPurge::Result::kDone) result = purges_->meta.Turn(documents, pages);
+  if (result != WordPurge::Result::kUnknownFormat)
+    return result == WordPurge::Result::kDone ? Purged::kDone : Purged::kMore;
+  purges_.reset();
+  return Purged::kImpossible;
+}
+
+void SqliteWords::RemovePurged(int64_t id) { database_.Prepare("DELETE FROM bodies WHERE id = ?1").Bind(1, id).Run(); }
+
 /// The old text is in "bodies" still, which is what the full-text table was given.
-void TextWriter::WriteText(int64_t id, const Pending& pending) {
+void SqliteWords::WriteText(int64_t id, const Pending& pending) {
   if (pending.old_meta.has_value()) {
     const std::string before = StoredText(id);
     if (before == pending.text.value_or("")) return;
@@ -105,14 +122,14 @@ void TextWriter::WriteText(int64_t id, const Pending& pending) {
   store.Bind(1, id).BindBlob(2, codec_.Pack(*pending.text)).Run();
 }
 
-void TextWriter::WriteMeta(int64_t id, const Pending& pending) {
+void SqliteWords::WriteMeta(int64_t id, const Pending& pending) {
   if (pending.old_meta == pending.new_meta) return;
   if (pending.old_meta.has_value()) InsertMeta(id, *pending.old_meta, true);
   if (pending.new_meta.has_value()) InsertMeta(id, *pending.new_meta, false);
 }
 
 /// Adds words to the full-text table, or removes them: both are insertions, the latter with the command 'delete'.
-void TextWriter::InsertMeta(int64_t id, const MetaText& meta, bool remove) {
+void SqliteWords::InsertMeta(int64_t id, const MetaText& meta, bool remove) {
   Statement statement = database_.Prepare(
       remove ? "INSERT INTO meta_fts(meta_fts, rowid, grams, name, title, text, fields)"
                " VALUES('delete', ?1, ?2, ?3, ?4, ?5, ?6)"
