@@ -14,6 +14,8 @@ namespace {
 
 /// The write-ahead log is cut after a transaction that made it longer than this many bytes.
 constexpr int64_t kLogMaxBytes = 16 << 20;
+/// The same while documents are cleared: turns change the same pages of the columns' indexes again and again.
+constexpr int64_t kClearingLogMaxBytes = 64 << 20;
 
 Database::Mode OpeningMode(const std::string& path, bool create) {
   return create && !IsFileExist(path) ? Database::Mode::kCreate : Database::Mode::kWrite;
@@ -51,9 +53,11 @@ void Catalogue::Commit() {
 }
 
 /// After a large transaction, moves the write-ahead log into the database and cuts it, unless somebody reads it just
-/// now.
+/// now. While documents are to be cleared SQLite does not do the former by itself at each commit.
 void Catalogue::ShortenLog() {
-  if (BytesOnDisk(database_.Path() + "-wal") < kLogMaxBytes) return;
+  const bool clears = totals_.clearing > 0;
+  (void)sqlite3_wal_autocheckpoint(database_.Handle(), clears ? 0 : kLogPages);
+  if (BytesOnDisk(database_.Path() + "-wal") < (clears ? kClearingLogMaxBytes : kLogMaxBytes)) return;
   (void)sqlite3_busy_timeout(database_.Handle(), 0);
   const int result =
       sqlite3_wal_checkpoint_v2(database_.Handle(), nullptr, SQLITE_CHECKPOINT_TRUNCATE, nullptr, nullptr);

@@ -136,7 +136,7 @@ void PrepareStore(Database& database, bool create) {
   // the disk when it returns.
   database.Execute("PRAGMA journal_mode = WAL");
   database.Execute("PRAGMA synchronous = FULL");
-  database.Execute("PRAGMA wal_autocheckpoint = 1000");  // pages
+  database.Execute("PRAGMA wal_autocheckpoint = " + std::to_string(kLogPages));
   database.Execute("PRAGMA journal_size_limit = 8388608");
   RegisterFullText(database);
   if (!is_new) return AddAccess(database);

@@ -20,6 +20,9 @@ inline constexpr int64_t kWordsFormat = 2;
 /// Whether the file has an older format.
 bool NeedsUpgrade(const std::string& path);
 
+/// SQLite moves the write-ahead log into the file when a commit has made it longer than so many pages.
+inline constexpr int kLogPages = 1000;
+
 /// Makes a connection that writes ready: its settings, the tokenizer and, with `create` in a file without tables, the
 /// tables. Blocks while another connection writes, at most Database::kBusyTimeoutMs. A file of an older format is
 /// refused, too.
