@@ -1,5 +1,6 @@
 #include "common/log.h"
 #include "services/kovaelasticd/commands/commands.h"
+#include "services/kovaelasticd/commands/members.h"
 #include "services/kovaelasticd/store/access_records.h"
 #include "services/kovaelasticd/store/file_stamp.h"
 

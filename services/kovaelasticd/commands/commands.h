@@ -1,6 +1,6 @@
 #pragma once
 
-#include <optional>
+#include <span>
 #include <string>
 
 #include <json/value.h>
@@ -10,7 +10,8 @@
 namespace ferrox::engine {
 
 /// The commands of docs/formats/engine.md: a table of names and functions. Each function reads its members with the
-/// helpers below, which refuse what is missing or of another type by naming it, and does its work through the registry.
+/// helpers of members.h, which refuse what is missing or of another type by naming it, and does its work through the
+/// registry.
 
 /// One command of a request.
 struct CommandCall {
@@ -50,18 +51,9 @@ void Apply(IndexStore& store, const DocumentChange& change);
 /// The product's version, from the build.
 inline constexpr char kVersion[] = FERROX_VERSION;
 
-// Reading of members, common to all commands. Null and a missing member are the same, and stand for `otherwise`.
-// @throws Error kEngineBadRequest naming the member and what it must be.
-std::string RequiredText(const Json::Value& data, const char* name);
-std::optional<std::string> OptionalText(const Json::Value& data, const char* name);
-const Json::Value& RequiredObject(const Json::Value& data, const char* name);
-int64_t OptionalInt(const Json::Value& data, const char* name, int64_t otherwise, int64_t low, int64_t high);
-bool OptionalBool(const Json::Value& data, const char* name, bool otherwise);
-
-[[noreturn]] void RefuseMember(const char* name, const std::string& must_be);
-/// `path`, if it is one that a document or an index may have. `name` is the member that it stands in.
-std::string CheckedPath(const char* name, const std::string& path);
-
+// Where the functions are, by source.
+std::span<const Command> IndexCommands();     ///< index_commands.cpp
+std::span<const Command> DocumentCommands();  ///< document_commands.cpp
 /// The command "access_set" (access_command.cpp).
 Json::Value RunAccessSet(CommandCall& call);
 /// The command "search" (search_command.cpp).

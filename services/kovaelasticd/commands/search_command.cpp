@@ -8,6 +8,7 @@
 #include "common/error.h"
 #include "common/json_util.h"
 #include "services/kovaelasticd/commands/commands.h"
+#include "services/kovaelasticd/commands/members.h"
 #include "services/kovaelasticd/query/query.h"
 #include "services/kovaelasticd/store/store_rows.h"
 
