@@ -63,7 +63,7 @@ void Clearing::Turn() {
 }
 
 void Clearing::BeginPurge() {
-  purge_.emplace();
+  purge_.emplace(Purge{DocSet(), false});
   Statement documents = database_.Prepare("SELECT id FROM docs WHERE folder = ?1");
   for (const int64_t gone : FolderTree::GoneAfter(database_, "")) {
     for (const int64_t folder : tree_.AtAndBelow(gone)) {

@@ -50,7 +50,7 @@ class Clearing {
   /// Documents whose words are taken out together.
   struct Purge {
     DocSet documents;
-    bool done = false;
+    bool done;
   };
 
   void BeginPurge();
