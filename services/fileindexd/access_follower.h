@@ -31,7 +31,9 @@ class AccessFollower {
 
   /// All that `context` refers to outlives the follower. Does nothing before Start.
   explicit AccessFollower(const Context& context)
-      : context_(context), tail_(context.queue_path), thread_(context.interruption, context.interval) {}
+      : context_(context),
+        tail_(context.queue_path),
+        thread_(context.interruption, context.interval, kFirstIntervals * context.interval) {}
 
   void Start();
   /// May be called again, and without a Start.
@@ -42,6 +44,9 @@ class AccessFollower {
  private:
   void RecordChanges();
   std::set<std::string> PathsOf(const AttributeChanges& changes);
+
+  /// Most passes end before that, and the next one does the same work.
+  static constexpr int kFirstIntervals = 2;
 
   const Context context_;
   QueueTail tail_;

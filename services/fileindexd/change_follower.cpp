@@ -16,7 +16,7 @@ ChangeFollower::ChangeFollower(const Context& context)
       rules_(context.share, context.root, context.folders),
       tasks_(context.pool, context.interruption),
       tail_(context.queue_path),
-      thread_(context.interruption, context.interval) {
+      thread_(context.interruption, context.interval, context.interval) {
   tasks_.SetUrgent(true);
 }
 

@@ -28,7 +28,7 @@ void RepeatingThread::ThrowIfFailed() {
 void RepeatingThread::Run(const Step& step) {
   const InterruptionScope scope(interruption_);
   try {
-    auto took = steady_clock::duration::zero();
+    steady_clock::duration took = first_;
     for (bool is_more = true; is_more && Pause(took);) {
       const auto begin = steady_clock::now();
       is_more = step();

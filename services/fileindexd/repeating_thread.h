@@ -17,9 +17,10 @@ class RepeatingThread {
   /// One time; false ends the thread.
   using Step = std::function<bool()>;
 
-  /// The thread runs under `interruption`, which outlives it; the pauses are of at least `interval`.
-  RepeatingThread(const Interruption& interruption, std::chrono::milliseconds interval)
-      : interruption_(interruption), interval_(interval) {}
+  /// The thread runs under `interruption`, which outlives it; the pauses are of at least `interval`, the first one of
+  /// `first`.
+  RepeatingThread(const Interruption& interruption, std::chrono::milliseconds interval, std::chrono::milliseconds first)
+      : interruption_(interruption), interval_(interval), first_(first) {}
   RepeatingThread(const RepeatingThread&) = delete;
   RepeatingThread& operator=(const RepeatingThread&) = delete;
   ~RepeatingThread() { Stop(); }
@@ -37,6 +38,7 @@ class RepeatingThread {
 
   const Interruption& interruption_;
   const std::chrono::milliseconds interval_;
+  const std::chrono::milliseconds first_;
   base::Mutex mutex_;
   base::ConditionVariable stop_changed_;
   bool stopping_ BASE_GUARDED_BY(mutex_) = false;
