@@ -7,20 +7,22 @@ set(ferrox_common_headers <algorithm> <array> <atomic> <cerrno> <chrono> <condit
     <functional> <map> <memory> <mutex> <optional> <set> <string> <string_view> <thread> <unordered_map> <utility> <vector>
     <json/value.h>)
 
-# ferrox_group_sources(FOLDER): the sources of each library of FOLDER and below are compiled in groups. So many in one
-# that the next build after a change of one source still takes few seconds.
-function(ferrox_group_sources folder)
+# ferrox_group_sources(COUNT TYPES SOURCES FOLDER): sources are compiled in groups of COUNT, in all targets of FOLDER and
+# below whose type matches TYPES and one of whose sources matches SOURCES. So many in one that the next build after a
+# change of one source still takes few seconds.
+function(ferrox_group_sources count types of_sources folder)
   get_property(targets DIRECTORY ${folder} PROPERTY BUILDSYSTEM_TARGETS)
   foreach(target ${targets})
     get_target_property(type ${target} TYPE)
-    if(type MATCHES LIBRARY)
-      set_target_properties(${target} PROPERTIES UNITY_BUILD ON UNITY_BUILD_BATCH_SIZE 10
+    get_target_property(sources ${target} SOURCES)
+    if(type MATCHES ${types} AND sources MATCHES ${of_sources})
+      set_target_properties(${target} PROPERTIES UNITY_BUILD ON UNITY_BUILD_BATCH_SIZE ${count}
                                                  UNITY_BUILD_CODE_BEFORE_INCLUDE "#undef FERROX_SOURCE")
     endif()
   endforeach()
   get_property(folders DIRECTORY ${folder} PROPERTY SUBDIRECTORIES)
   foreach(below ${folders})
-    ferrox_group_sources(${below})
+    ferrox_group_sources(${count} ${types} ${of_sources} ${below})
   endforeach()
 endfunction()
 
@@ -48,12 +50,13 @@ if(FERROX_FAST_BUILD)
   target_link_libraries(precompiled_for_products PRIVATE PkgConfig::jsoncpp ferrox_options)
   target_precompile_headers(precompiled_for_products PRIVATE ${ferrox_common_headers})
   foreach(folder base wire fileindex services cli)
-    ferrox_group_sources(${CMAKE_SOURCE_DIR}/${folder})
+    ferrox_group_sources(10 LIBRARY "[.]cpp" ${CMAKE_SOURCE_DIR}/${folder})
     ferrox_precompile(precompiled_for_products "LIBRARY|EXECUTABLE" "[.]cpp" ${CMAKE_SOURCE_DIR}/${folder})
   endforeach()
-  ferrox_group_sources(${CMAKE_SOURCE_DIR}/platform)
+  ferrox_group_sources(10 LIBRARY "[.]cpp" ${CMAKE_SOURCE_DIR}/platform)
   if(FERROX_BUILD_TESTS)
-    ferrox_group_sources(${CMAKE_SOURCE_DIR}/tests/support)
+    ferrox_group_sources(10 LIBRARY "[.]cpp" ${CMAKE_SOURCE_DIR}/tests/support)
+    ferrox_group_sources(3 EXECUTABLE "_test[.]cpp" ${CMAKE_SOURCE_DIR}/tests)
     find_package(GTest REQUIRED)
     file(WRITE ${CMAKE_BINARY_DIR}/precompiled_program.cpp "int main() {}\n")
     add_executable(precompiled_for_tests ${CMAKE_BINARY_DIR}/precompiled_program.cpp)

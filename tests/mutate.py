@@ -10,7 +10,7 @@ is run and counted for itself, so that the tests before and after a cut are comp
 compile is no mutant. Results are kept by line in FILE: those that are in it are not tried again. Sources are put back,
 also after an interrupt; use a worktree in which nothing else is built meanwhile.
 
-tests/mutate.py --target words_test engine_test --run 'build/release/bin/words_test' --run 'build/release/bin/engine_test'
+tests/mutate.py --target engine_tests --run 'build/release/bin/engine_tests'
     --sample 30 services/kovaelasticd/text/words.cpp
 """
 import argparse

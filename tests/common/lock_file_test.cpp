@@ -47,7 +47,7 @@ TEST_F(LockFileTest, IsWaitedForAtMost64Times) {
     EXPECT_NE(fcntl(held.Descriptor(), F_GETFD) & FD_CLOEXEC, 0);
     EXPECT_EQ(Failure("lock", false), "") << "shared holders coexist";
     EXPECT_EQ(Failure("lock"), "506 Exceed max retry, path=" + dir_ / "lock");
-    EXPECT_TRUE(test::LogCapture::Contains("lock: process " + std::to_string(getpid()) + " (lock_file_test) of user "));
+    EXPECT_TRUE(test::LogCapture::Contains("lock: process " + std::to_string(getpid()) + " (common_tests) of user "));
   }
   ASSERT_EQ(clock_.sleeps.size(), 64U);
   for (const auto pause : clock_.sleeps) EXPECT_TRUE(pause.count() <= 900 && pause.count() % 100 == 0) << pause.count();
