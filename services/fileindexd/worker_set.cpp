@@ -28,14 +28,14 @@ void WorkerSet::Reconcile() {
 
 void WorkerSet::Create(const std::string& share) {
   const base::MutexLock order(order_mutex_);
-  commands_[share] = Command::kCreate;
+  commands_[share] = Command::kCreateIndex;
   End(share);
   ReconcileInOrder();
 }
 
 void WorkerSet::Delete(const std::string& share) {
   const base::MutexLock order(order_mutex_);
-  commands_[share] = Command::kDelete;
+  commands_[share] = Command::kDeleteIndex;
   End(share);
 }
 
@@ -87,7 +87,7 @@ void WorkerSet::MakeMissing(const IndexedShares& indexed_shares) {
 bool WorkerSet::ShouldRun(const std::string& share, const IndexedShare& indexed) {
   const auto command = commands_.find(share);
   if (command == commands_.end()) return !indexed.all_paused;
-  const bool wanted = command->second == Command::kCreate;
+  const bool wanted = command->second == Command::kCreateIndex;
   if (wanted == !indexed.all_paused) commands_.erase(command);
   return wanted;
 }

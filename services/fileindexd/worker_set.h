@@ -57,7 +57,7 @@ class WorkerSet {
   uint64_t FilesRead() const;
 
  private:
-  enum class Command { kCreate, kDelete };
+  enum class Command { kCreateIndex, kDeleteIndex };
   using Workers = std::map<std::string, std::shared_ptr<ShareWorker>>;
 
   Workers Present() const;
