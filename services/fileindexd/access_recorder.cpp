@@ -11,7 +11,8 @@ namespace ferrox::indexd {
 
 namespace {
 
-/// So often rights are recorded that do not stay the same. Each change has an event, so the last is not missed.
+/// How many times the rights of a file are recorded while they keep changing. Each change has an event of its own, so
+/// the last is not missed.
 constexpr int kRecordingsMax = 3;
 
 }  // namespace

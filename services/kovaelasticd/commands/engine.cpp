@@ -8,6 +8,7 @@
 #include "common/json_scan.h"
 #include "common/json_util.h"
 #include "common/log.h"
+#include "services/kovaelasticd/commands/members.h"
 
 namespace ferrox::engine {
 
