@@ -12,6 +12,9 @@ Workloads, each in an instance of its own, with text files of 50 words drawn at 
   slow     the same on an instance that indexes 200 PDFs beside, each of which takes a reader some seconds.
   bulk     a tree of --bulk files in folders of 16, three deep, copied into the share; a folder with --files files renamed,
            and removed: seconds that the operation itself took, and until both daemons have answered "sync" behind it.
+  folder   a folder with --files files renamed 20 times: seconds until a word in it is found below the new name, and the
+           processor time of index daemon and engine until both have verified it on the disk. Then it leaves the share: until
+           nothing is found, and the processor time until its words are out of the index.
   rights   chmod -R of --files files: seconds until both daemons have answered "sync" behind it, and the processor time of
            index daemon and engine. Then a share of as many files is indexed for the first time, and single files that it has
            already, one of them under a name outside of the share, have their mode changed: the clock runs until the index
@@ -243,6 +246,41 @@ def cpu_seconds(instance, *programs):
     return seconds
 
 
+def until(found, begin):
+    """Seconds since `begin`, once found() is true."""
+    while not found():
+        time.sleep(0.002)
+    return time.monotonic() - begin
+
+
+def bench_folder(instance, options, rng):
+    docs, daemons = instance.share("docs"), ("fileindexd", "kovaelasticd")
+    make_tree(f"{docs}/folder", options.files, rng)
+    fill(f"{docs}/folder/0/0/some.txt", rng, "inthefolder")
+    check(instance)
+    engine, path, waits, before = Engine(instance), f"{docs}/folder", [], cpu_seconds(instance, *daemons)
+    for number in range(20):
+        new_path, begin = f"{docs}/folder{number}", time.monotonic()
+        os.rename(path, new_path)
+        waits.append(until(lambda new_path=new_path: engine.found(f'inthefolder path:"{new_path}"'), begin))
+        instance.sync()
+        path = new_path
+    cpu = [(after - start) / len(waits) for start, after in zip(before, cpu_seconds(instance, *daemons))]
+    print(f"folder of {options.files} files renamed: found after p50 {percentile(waits, 0.5) * 1000:.0f} ms, slowest "
+          f"{max(waits) * 1000:.0f} ms; processor time {cpu[0]:.2f} + {cpu[1]:.2f} s each", flush=True)
+    check(instance)
+    before, begin = cpu_seconds(instance, *daemons), time.monotonic()
+    os.rename(path, f"{instance.root}/vol/left")
+    gone = until(lambda: not engine.found("inthefolder"), begin)
+    instance.sync()
+    stat = {"command": "index_stat", "data": {"id": "fileindex_docs"}}
+    cleared = until(lambda: "clearing" not in instance.ask("kovaelasticd", stat)["data"], begin)
+    cpu = [after - start for start, after in zip(before, cpu_seconds(instance, *daemons))]
+    print(f"the same leaves the share: not found after {gone * 1000:.0f} ms, cleared after {cleared:.1f} s; processor time "
+          f"{cpu[0]:.2f} + {cpu[1]:.2f} s", flush=True)
+    check(instance)
+
+
 def indexed_access(instance, share, path):
     query = {"qsl": {"term": {"KOVAMDPath": path}}, "load_field": ["_KOVAAccess"]}
     reply = instance.ask("kovaelasticd", {"command": "document_get_by_query",
@@ -285,7 +323,7 @@ def bench_rights(instance, options, rng):
 
 def main():
     parser = argparse.ArgumentParser(description=__doc__, formatter_class=argparse.RawDescriptionHelpFormatter)
-    parser.add_argument("workloads", nargs="*", help="latency, slow, return, bulk, rights; absent: all")
+    parser.add_argument("workloads", nargs="*", help="latency, slow, return, bulk, folder, rights; absent: all")
     parser.add_argument("--build", default=f"{SOURCE}/build/release")
     parser.add_argument("--way", default="", choices=sorted(WAY), help="of watching; absent: the daemon's choice")
     parser.add_argument("--samples", type=int, default=300)
@@ -298,7 +336,7 @@ def main():
     from live import LiveInstance  # pylint: disable=import-outside-toplevel
 
     for name, bench in (("latency", bench_latency), ("slow", bench_slow), ("return", bench_return), ("bulk", bench_bulk),
-                        ("rights", bench_rights)):
+                        ("folder", bench_folder), ("rights", bench_rights)):
         if options.workloads and name not in options.workloads:
             continue
         instance = LiveInstance()

@@ -8,7 +8,7 @@ namespace ferrox::engine {
 template <typename Next>
 int64_t FolderTree::Descend(std::string_view folder_path, Next next) {
   int64_t folder = kTop;
-  folder_path.remove_prefix(1);
+  if (!folder_path.empty()) folder_path.remove_prefix(1);  // it begins with the name of the top
   while (folder != kNone && !folder_path.empty()) {
     const std::string_view name = folder_path.substr(0, folder_path.find('/') + 1);
     folder = next(folder, name);

@@ -38,7 +38,7 @@ class FolderTree {
   static std::string_view FolderOf(std::string_view path) { return path.substr(0, path.rfind('/') + 1); }
   static std::string_view LeafOf(std::string_view path) { return path.substr(path.rfind('/') + 1); }
 
-  /// The folder with that path, which ends with "/"; kNone when there is none.
+  /// The folder with that path, which ends with "/" or is empty, as the top's may be; kNone when there is none.
   int64_t Find(std::string_view folder_path);
   /// The same; makes it, and those missing above it.
   int64_t Make(std::string_view folder_path);
