@@ -1,5 +1,6 @@
 // Commands that change documents, and the one that lists them.
 #include <limits>
+#include <utility>
 
 #include "base/path.h"
 #include "common/json_util.h"
@@ -40,6 +41,14 @@ GetRequest ReadQuery(const Json::Value& query) {
   return request;
 }
 
+/// What a member of a listed document takes in the reply, roughly.
+int64_t BytesOf(const Json::Value& member) {
+  constexpr int64_t kOthers = 32;
+  const char* begin = nullptr;
+  const char* end = nullptr;
+  return member.isString() && member.getString(&begin, &end) ? kOthers + (end - begin) : kOthers;
+}
+
 /// Runs on the index's thread and so sees changes that are not committed yet, unlike a search.
 Json::Value OnGetByQuery(CommandCall& call) {
   const Registry::OpenIndex open = call.registry.Open(IndexId(call.data));
@@ -56,13 +65,13 @@ Json::Value OnGetByQuery(CommandCall& call) {
   Json::Value list(Json::arrayValue);
   open.index->Read([&](IndexStore& store) {
     int64_t bytes = 0;
-    store.Get(request, [&](const Json::Value& entry) {
-      for (const Json::Value& member : entry) bytes += member.isString() ? 32 + int64_t(member.asString().size()) : 32;
+    store.Get(request, [&](Json::Value entry) {
+      for (const Json::Value& member : entry) bytes += BytesOf(member);
       if (bytes > kListMaxBytes) {
         throw Error(Error::kEngineBadRequest,
                     "the list is too long for one reply; ask for it in pages, with \"limit\" and \"after\"");
       }
-      list.append(entry);
+      list.append(std::move(entry));
     });
   });
   return list;

@@ -119,7 +119,7 @@ class IndexStore {
   /// Large folders cost no more than a look at the rows of their documents. Their words are left to ClearSome.
   virtual void DeletePrefix(const std::string& prefix) = 0;
   /// Lists documents, uncommitted ones too.
-  virtual void Get(const GetRequest& request, const std::function<void(const Json::Value&)>& take) = 0;
+  virtual void Get(const GetRequest& request, const std::function<void(Json::Value)>& take) = 0;
   /// Makes all changes durable and visible to Search.
   virtual void Commit() = 0;
   /// Forgets the changes since the last commit.

@@ -43,7 +43,7 @@ Json::Value SqliteStore::LoadEntry(const StoredDocument& stored, const std::vect
   return entry;
 }
 
-void SqliteStore::Get(const GetRequest& request, const std::function<void(const Json::Value&)>& take) {
+void SqliteStore::Get(const GetRequest& request, const std::function<void(Json::Value)>& take) {
   catalogue_.List(request, [&](const StoredDocument& stored) { take(LoadEntry(stored, request.fields)); });
 }
 

@@ -31,7 +31,7 @@ class SqliteStore : public IndexStore {
   AccessReport SetAccess(const std::vector<AccessChange>& changes) override;
   void Delete(const std::string& path) override;
   void DeletePrefix(const std::string& prefix) override;
-  void Get(const GetRequest& request, const std::function<void(const Json::Value&)>& take) override;
+  void Get(const GetRequest& request, const std::function<void(Json::Value)>& take) override;
   void Commit() override;
   void Rollback() override;
   int64_t UncommittedBytes() const override { return uncommitted_bytes_; }
