@@ -17,33 +17,20 @@ constexpr size_t kPlacesForAFolder = 4096;
 }  // namespace
 
 PathCondition::PathCondition(StoreReader& reader, int64_t version, const std::string& path)
-    : reader_(reader), version_(version), path_(path), folder_(reader.tree.Find(path == "/" ? path : path + "/")) {
+    : reader_(reader), version_(version), path_(path), folder_(reader.tree.Find(path + "/")) {
   const std::optional<StoredDocument> itself = FindDocument(reader_.database, reader_.tree, path);
   if (itself.has_value()) itself_ = itself->id;
 }
 
 std::optional<std::vector<int64_t>> PathCondition::FewFolders(size_t most) {
-  std::vector<int64_t> folders;
-  if (folder_ != FolderTree::kNone) folders.push_back(folder_);
-  Statement below = reader_.database.Prepare("SELECT id FROM folders WHERE parent = ?1");
-  for (size_t i = 0; i < folders.size(); ++i) {
-    for (below.Bind(1, folders[i]); below.Step();) {
-      if (folders.size() >= most) return std::nullopt;
-      folders.push_back(below.Int(0));
-    }
-    below.Reset();
-  }
-  return folders;
+  if (folder_ == FolderTree::kNone) return std::vector<int64_t>();
+  return reader_.tree.AtAndBelow(folder_, most);
 }
 
 DocSet PathCondition::DocumentsIn(const std::vector<int64_t>& folders) {
   DocSet found;
   if (itself_ >= 0) found.Add(itself_);
-  Statement documents = reader_.database.Prepare("SELECT id FROM docs WHERE folder = ?1");
-  for (const int64_t folder : folders) {
-    for (documents.Bind(1, folder); documents.Step();) found.Add(documents.Int(0));
-    documents.Reset();
-  }
+  AddDocumentsIn(reader_.database, folders, found);
   return found;
 }
 

@@ -18,7 +18,8 @@ namespace ferrox::engine {
 /// listed. All else goes by the index's places in memory, which are read for it when nobody has needed them lately.
 class PathCondition {
  public:
-  /// `version` is that of the snapshot that `reader`, which must outlive this, has a transaction on.
+  /// `version` is that of the snapshot that `reader`, which must outlive this, has a transaction on. `path` has no "/"
+  /// at its end, so the top is "".
   PathCondition(StoreReader& reader, int64_t version, const std::string& path);
 
   DocSet AllDocuments();

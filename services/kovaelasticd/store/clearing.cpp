@@ -64,12 +64,8 @@ void Clearing::Turn() {
 
 void Clearing::BeginPurge() {
   purge_.emplace(Purge{DocSet(), false});
-  Statement documents = database_.Prepare("SELECT id FROM docs WHERE folder = ?1");
   for (const int64_t gone : FolderTree::GoneAfter(database_, "")) {
-    for (const int64_t folder : tree_.AtAndBelow(gone)) {
-      for (documents.Bind(1, folder); documents.Step();) purge_->documents.Add(documents.Int(0));
-      documents.Reset();
-    }
+    AddDocumentsIn(database_, tree_.AtAndBelow(gone), purge_->documents);
   }
 }
 

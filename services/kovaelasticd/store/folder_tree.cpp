@@ -1,5 +1,7 @@
 #include "services/kovaelasticd/store/folder_tree.h"
 
+#include <limits>
+
 #include "services/kovaelasticd/store/store_rows.h"
 #include "services/kovaelasticd/text/schema.h"
 
@@ -78,10 +80,17 @@ std::string FolderTree::PathOf(int64_t folder) {
 }
 
 std::vector<int64_t> FolderTree::AtAndBelow(int64_t folder) {
+  return *AtAndBelow(folder, std::numeric_limits<size_t>::max());
+}
+
+std::optional<std::vector<int64_t>> FolderTree::AtAndBelow(int64_t folder, size_t most) {
   std::vector<int64_t> folders = {folder};
   Statement below = database_.Prepare("SELECT id FROM folders WHERE parent = ?1");
   for (size_t i = 0; i < folders.size(); ++i) {
-    for (below.Bind(1, folders[i]); below.Step();) folders.push_back(below.Int(0));
+    for (below.Bind(1, folders[i]); below.Step();) {
+      if (folders.size() >= most) return std::nullopt;
+      folders.push_back(below.Int(0));
+    }
     below.Reset();
   }
   return folders;

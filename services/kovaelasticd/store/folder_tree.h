@@ -1,5 +1,6 @@
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
 #include <map>
 #include <optional>
@@ -34,7 +35,7 @@ class FolderTree {
   explicit FolderTree(Database& database, bool flat = false) : database_(database), flat_(flat) {}
   bool IsFlat() const { return flat_; }
 
-  /// The part of a path that is its folder, with the "/" at its end. "/" at least: paths are absolute.
+  /// The part of a path that is its folder, with the "/" at its end. "/" at least, but for the empty path.
   static std::string_view FolderOf(std::string_view path) { return path.substr(0, path.rfind('/') + 1); }
   static std::string_view LeafOf(std::string_view path) { return path.substr(path.rfind('/') + 1); }
 
@@ -46,6 +47,8 @@ class FolderTree {
   std::string PathOf(int64_t folder);
   /// The folder and all below it, each before those in it.
   std::vector<int64_t> AtAndBelow(int64_t folder);
+  /// The same; nothing when there are more than `most`.
+  std::optional<std::vector<int64_t>> AtAndBelow(int64_t folder, size_t most);
   /// The folders in `folder` whose names begin with `begin`; all for "".
   std::vector<int64_t> ChildrenOf(int64_t folder, const std::string& begin);
   /// Whether a folder is `other`, or lies below it.

@@ -1,8 +1,7 @@
 #include "services/kovaelasticd/store/hidden_documents.h"
 
-#include <vector>
-
 #include "services/kovaelasticd/store/folder_tree.h"
+#include "services/kovaelasticd/store/store_rows.h"
 
 namespace ferrox::engine {
 
@@ -22,12 +21,8 @@ std::shared_ptr<const DocSet> HiddenDocuments::Of(Database& database) {
   if (known == newest) return set;
   auto grown = set == nullptr ? std::make_shared<DocSet>() : std::make_shared<DocSet>(*set);
   FolderTree tree(database);
-  Statement documents = database.Prepare("SELECT id FROM docs WHERE folder = ?1");
   for (const int64_t gone : FolderTree::GoneAfter(database, known)) {
-    for (const int64_t folder : tree.AtAndBelow(gone)) {
-      for (documents.Bind(1, folder); documents.Step();) grown->Add(documents.Int(0));
-      documents.Reset();
-    }
+    AddDocumentsIn(database, tree.AtAndBelow(gone), *grown);
   }
   const base::MutexLock guard(mutex_);
   if (newest_ < newest) {

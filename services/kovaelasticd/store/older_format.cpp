@@ -17,7 +17,7 @@ bool PrepareOlderFormat(Database& database) {
 
 DocSet DocumentsAtWholePath(Database& database, const std::string& path) {
   Statement statement = database.Prepare("SELECT id FROM main.docs WHERE path = ?1 OR (path >= ?2 AND path < ?3)");
-  const std::string below = path == "/" ? path : path + "/";
+  const std::string below = path + "/";
   const std::string end = EndOfPrefix(below);
   statement.Bind(1, std::string_view(path)).Bind(2, std::string_view(below));
   BindEnd(statement, 3, end);

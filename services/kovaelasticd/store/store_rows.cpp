@@ -64,6 +64,14 @@ std::optional<StoredDocument> FindDocument(Database& database, FolderTree& tree,
   return folder_path.empty() ? std::nullopt : std::optional<StoredDocument>(ReadRow(statement, folder_path));
 }
 
+void AddDocumentsIn(Database& database, const std::vector<int64_t>& folders, DocSet& documents) {
+  Statement rows = database.Prepare("SELECT id FROM docs WHERE folder = ?1");
+  for (const int64_t folder : folders) {
+    for (rows.Bind(1, folder); rows.Step();) documents.Add(rows.Int(0));
+    rows.Reset();
+  }
+}
+
 Totals LoadTotals(Database& database) {
   Totals totals;
   std::optional<int64_t> without_access, last_id;  // a file from before these were kept has none

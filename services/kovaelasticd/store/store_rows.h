@@ -4,7 +4,9 @@
 #include <optional>
 #include <string>
 #include <string_view>
+#include <vector>
 
+#include "services/kovaelasticd/store/doc_set.h"
 #include "services/kovaelasticd/store/document.h"
 #include "services/kovaelasticd/store/folder_tree.h"
 #include "services/kovaelasticd/store/sqlite_db.h"
@@ -45,6 +47,9 @@ void BindRow(Statement& statement, int64_t folder, const DocRow& row, int64_t te
 /// follow.
 std::optional<StoredDocument> FindDocument(Database& database, FolderTree& tree, const std::string& path);
 std::optional<StoredDocument> FindDocument(Database& database, FolderTree& tree, int64_t id);
+
+/// Adds the documents that lie in these folders, not those in folders below.
+void AddDocumentsIn(Database& database, const std::vector<int64_t>& folders, DocSet& documents);
 
 /// The table "info", as of the reader's snapshot or the writer's last SaveTotals.
 Totals LoadTotals(Database& database);
