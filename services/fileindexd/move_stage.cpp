@@ -14,7 +14,7 @@ namespace {
 
 /// So many folders, and places that hold documents, are searched for what has moved; with more, files are read again.
 constexpr size_t kSearchedMax = 100;
-/// Of so many removed paths in a pass it is asked whether they were folders.
+/// The index is asked of the first removed paths of a pass, up to this many, whether they were folders.
 constexpr int kAskedMax = 20;
 /// So many paths may be under way at once; bounds memory.
 constexpr size_t kUnderWayMax = 10000;
@@ -36,7 +36,8 @@ void MoveStage::Delete(const std::string& path) {
   struct stat status = {};
   if (PresenceOf(path, status) != Presence::kGone) return;
   BeginOn({path});
-  // To ask costs a round trip; with so many there are folders among them, or the commit is a small part of the pass.
+  // To ask costs a round trip. Behind kAskedMax there are folders among them, or the commit is a small part of the
+  // pass.
   removed_folder_ = removed_folder_ || ++removed_ > kAskedMax || !context_.index.List(path, "", 1).empty();
   gone_trees_.Add(path);
 }

@@ -8,10 +8,11 @@ namespace ferrox::engine {
 
 namespace {
 
-/// Up to so many documents are looked at by their rows, and so many folders are listed, at some microseconds each.
+/// The most documents whose rows are read, and the most folders that are listed, while the places are not in memory;
+/// each takes some microseconds.
 constexpr int64_t kOneByOneMax = 200;
 constexpr size_t kFoldersListedMax = 200;
-/// Of the documents with so many numbers the places are looked at in the time in which a folder is listed.
+/// How many places of documents are looked through in the time that the listing of one folder takes.
 constexpr size_t kPlacesForAFolder = 4096;
 
 }  // namespace
