@@ -46,6 +46,9 @@ class FERROX_EXPORT Error : public std::runtime_error {
     kEngineIndexPaused = 1409,      ///< the index is paused
     kEngineIndexRebuilding = 1410,  ///< the index is being rebuilt; what it holds by now was searched
     kEngineIndexUpgrading = 1411,   ///< the index is brought to the present format; only searches are answered
+    kEngineIndexPreparing = 1412,   ///< the rights of its files are still being recorded; it is not searched for users
+    kEngineRightsUnknown = 1413,    ///< what the asking user may read cannot be checked now; nothing was shown
+    kEngineUserBusy = 1414,         ///< the asking user, or all users together, have too many requests at work
     kTreeInconsistent = 9999,       ///< a path that the operation tree cannot hold
   };
 

@@ -25,6 +25,7 @@ FERROX_EXPORT std::string InstanceRootProblem();
 inline constexpr char kFileIndexdSocket[] = "/var/run/fileindexd.sock";
 inline constexpr char kElasticdSocket[] = "/var/run/kovaelasticd.sock";
 inline constexpr char kNotifydSocket[] = "/var/run/kovanotifyd.sock";
+inline constexpr char kAccessSocket[] = "/var/run/kova-access.sock";
 inline constexpr char kContentExtractdSocket[] = "/var/run/kovacontentextractd.sock";
 /// The indexed folders and the states of indexing; each is written under its lock file below.
 inline constexpr char kConfigurationFolder[] = "/var/packages/Ferrox/etc";

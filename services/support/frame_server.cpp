@@ -69,11 +69,24 @@ base::UniqueFd Listen(const std::string& path, mode_t mode) {
   return listener;
 }
 
+/// The supplementary groups of the peer. The kernel says how many there are when the room is too small.
+std::vector<gid_t> GroupsOf(int fd) {
+  std::vector<gid_t> groups(64);
+  auto size = static_cast<socklen_t>(groups.size() * sizeof(gid_t));
+  int result = getsockopt(fd, SOL_SOCKET, SO_PEERGROUPS, groups.data(), &size);
+  if (result != 0 && errno == ERANGE) {
+    groups.resize(size / sizeof(gid_t));
+    result = getsockopt(fd, SOL_SOCKET, SO_PEERGROUPS, groups.data(), &size);
+  }
+  groups.resize(result == 0 ? size / sizeof(gid_t) : 0);
+  return groups;
+}
+
 Peer PeerOf(int fd) {
   ucred credentials = {};
   socklen_t size = sizeof(credentials);
   if (getsockopt(fd, SOL_SOCKET, SO_PEERCRED, &credentials, &size) != 0) return {static_cast<uid_t>(-1)};
-  return {credentials.uid, credentials.gid, credentials.pid};
+  return {credentials.uid, credentials.gid, credentials.pid, GroupsOf(fd)};
 }
 
 }  // namespace

@@ -7,16 +7,19 @@
 #include <functional>
 #include <memory>
 #include <string>
+#include <vector>
 
 #include "base/unique_fd.h"
 
 namespace ferrox::services {
 
-/// Who asks, as the kernel knew it when the connection was made (SO_PEERCRED): nothing that the peer says itself.
+/// Who asks, as the kernel knew it when the connection was made (SO_PEERCRED, SO_PEERGROUPS): nothing that the peer
+/// says itself.
 struct Peer {
   uid_t uid = 0;
   gid_t gid = 0;
   pid_t pid = 0;
+  std::vector<gid_t> groups = {};  ///< the supplementary ones, in the kernel's order; `gid` need not be among them
   int descriptor = -1;  ///< the last that came with its requests, open as long as its connection is; -1: none
 };
 

@@ -12,6 +12,7 @@
 #include <json/value.h>
 
 #include "services/kovaelasticd/query/query.h"
+#include "services/kovaelasticd/store/asker.h"
 
 namespace ferrox::engine {
 
@@ -43,6 +44,7 @@ struct SearchRequest {
   size_t ranked_max = 200000;  ///< so many documents, the newest added, are ranked at most for one word
   std::string mark_start = "[";
   std::string mark_end = "]";
+  const Asker* asker = nullptr;  ///< lives as long as the search; null: whoever asks may read everything
 };
 
 /// A document that was found, as it is shown.
@@ -53,6 +55,8 @@ struct SearchHit {
   std::string name_key;    ///< the name, for the same
   std::string snippet;
   Json::Value fields;
+  std::string stamp = {};  ///< "_KOVAStamp"; "": it has none
+  bool is_folder = false;
 };
 
 struct SearchReply {

@@ -1,0 +1,17 @@
+#pragma once
+
+#include <cstdint>
+#include <string>
+#include <vector>
+
+namespace ferrox::engine {
+
+/// An ordinary user who searches: what decides which documents of an index exist for them. Root and the owner of the
+/// instance are none, and see everything.
+struct Asker {
+  uint32_t uid = 0;
+  std::vector<uint32_t> groups;  ///< all, each once, in ascending order
+  std::string share_root;        ///< of the index: folders above it are not asked for their rights
+};
+
+}  // namespace ferrox::engine
