@@ -65,6 +65,16 @@ Json::Value IndexRebuiltRequest(const std::string& index_id, int64_t since) {
   return request;
 }
 
+Json::Value IndexShareRequest(const std::string& index_id, IndexShare share) {
+  Json::Value request = IndexRequest("index_share", index_id);
+  Json::Value& data = request["data"];
+  data["share"] = share.share;
+  data["root"] = share.root;
+  if (!share.refused.empty()) data["refused"] = share.refused;
+  if (!share.rules.isNull()) data["rules"] = std::move(share.rules);
+  return request;
+}
+
 /// "figures" is true unless it is given.
 Json::Value ListIndicesRequest(bool figures) {
   return figures ? EngineRequest("index_list") : EngineRequest("index_list", Object("figures", false));

@@ -26,6 +26,14 @@ Json::Value CreateIndexRequest(const std::string& index_id, const std::string& d
 Json::Value ConfigureIndexRequest(const std::string& index_id, const std::string& new_id, const std::string& db_path);
 /// Says that what the rebuilding `since` was to fill is filled; `since` tells it from other rebuildings.
 Json::Value IndexRebuiltRequest(const std::string& index_id, int64_t since);
+/// Says which share the index is of, so that ordinary users can search it.
+struct IndexShare {
+  std::string share;         ///< its name
+  std::string root;          ///< its folder
+  std::string refused = {};  ///< why ordinary users may not search it; "": they may
+  Json::Value rules = {};    ///< an object; null: none are known
+};
+Json::Value IndexShareRequest(const std::string& index_id, IndexShare share);
 /// All indices; with their figures, for which the engine opens each, or without.
 Json::Value ListIndicesRequest(bool figures);
 

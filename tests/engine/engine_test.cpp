@@ -9,6 +9,7 @@
 
 #include "services/kovaelasticd/store/sqlite_db.h"
 #include "tests/engine/engine_fixture.h"
+#include "wire/engine_requests.h"
 
 namespace ferrox::engine {
 namespace {
@@ -38,6 +39,10 @@ TEST_F(EngineTest, BadRequestsAreAnsweredWithTheirCode) {
       {"document_get_by_query", R"({"id":"a","query":{"qsl":{"match":{}}}})", 1403},
       {"document_get_by_query", R"({"id":"a","query":{"qsl":{"prefix":{"KOVAMDPath":"/"}},"load_field":[1]}})", 1403},
       {"document_del_by_query", R"({"id":"a","query":{"qsl":{"prefix":{"KOVAMDTitle":"/"}}}})", 1403},
+      {"index_share", R"({"id":"none","share":"s","root":"/s"})", 1404},
+      {"index_share", R"({"id":"a","share":"s/t","root":"/s"})", 1403},
+      {"index_share", R"({"id":"a","share":"s","root":"s"})", 1403},
+      {"index_share", R"({"id":"a","share":"s","root":"/s","rules":[]})", 1403},
       {"update_term_suggestion", R"({"doc_id_field":"KOVAMDTitle","db_name":"none"})", 1404},
       {"search", R"({"query":"a","limit":1001})", 1403},
       {"search", R"({"query":"a","sort":"colour"})", 1403},
@@ -89,6 +94,25 @@ TEST_F(EngineTest, OnlyRootAndTheOwnerMayDoMoreThanPing) {
   EXPECT_EQ(CodeOf(SendText(R"({"compound":[{"command":"ping"},{"command":"search","data":{"query":"a"}}]})", 54321)),
             1406);
   EXPECT_EQ(CodeOf(SendText(R"({"command":"index_list"})", geteuid())), 0);
+}
+
+TEST_F(EngineTest, ANotedShareLastsUntilTheIndexGetsAnotherId) {
+  ASSERT_EQ(Create("a", "a"), 0);
+  const ShareNote note{"photo", "/volume1/photo", "it is a snapshot", Json::Value(Json::objectValue)};
+  const Json::Value sent = wire::IndexShareRequest("a", {"photo", "/volume1/photo/", note.refused, note.rules});
+  EXPECT_EQ(CodeOf(SendText(toString(sent))), 0);
+  const auto noted = [this] {
+    engine_.reset();
+    const std::vector<Registry::Listed> listed = Registry(folder_ / "state").List();
+    Restart();
+    return listed.at(0).share;
+  };
+  ASSERT_NE(noted(), nullptr);
+  EXPECT_TRUE(*noted() == note);
+  EXPECT_EQ(CodeOf(SendText(toString(wire::ConfigureIndexRequest("a", "a", folder_ / "other")))), 0);
+  EXPECT_NE(noted(), nullptr);
+  EXPECT_EQ(CodeOf(SendText(toString(wire::ConfigureIndexRequest("a", "b", folder_ / "other")))), 0);
+  EXPECT_EQ(noted(), nullptr);
 }
 
 TEST_F(EngineTest, CompoundsGoOnAfterAFailedPart) {

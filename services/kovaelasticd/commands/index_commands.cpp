@@ -10,9 +10,9 @@ namespace ferrox::engine {
 
 namespace {
 
-/// An index's folder, without "/" at its end, so that one folder has one spelling.
-std::string FolderPath(const std::string& text) {
-  std::string path = CheckedPath("path", text);
+/// The folder that the member `name` tells, without "/" at its end, so that one folder has one spelling.
+std::string FolderPath(const char* name, const std::string& text) {
+  std::string path = CheckedPath(name, text);
   while (path.size() > 1 && path.back() == '/') path.pop_back();
   return path;
 }
@@ -36,7 +36,7 @@ void AddUpgrading(Index& index, Json::Value& result) {
 
 Json::Value OnIndexCreate(CommandCall& call) {
   const std::string id = IndexId(call.data);
-  const std::string path = FolderPath(RequiredText(call.data, "path"));
+  const std::string path = FolderPath("path", RequiredText(call.data, "path"));
   for (const char* name : {"settings", "event_handler"}) {
     if (!IsJsonObject(call.data[name])) RefuseMember(name, "an object");
   }
@@ -70,11 +70,25 @@ Json::Value OnIndexRebuilt(CommandCall& call) {
   return {};
 }
 
+/// What the share's name may be is left to the index daemon; it must be one that a path can hold.
+Json::Value OnIndexShare(CommandCall& call) {
+  const std::string id = IndexId(call.data);
+  ShareNote note;
+  note.share = RequiredText(call.data, "share");
+  if (note.share.empty() || note.share.find('/') != std::string::npos) RefuseMember("share", "the name of a share");
+  note.root = FolderPath("root", RequiredText(call.data, "root"));
+  note.refused = OptionalText(call.data, "refused").value_or("");
+  if (!IsJsonObject(call.data["rules"])) RefuseMember("rules", "an object");
+  note.rules = call.data["rules"];
+  call.registry.NoteShare(id, std::move(note));
+  return {};
+}
+
 Json::Value OnIndexConfigSet(CommandCall& call) {
   const std::string id = IndexId(call.data);
   const Json::Value& changes = RequiredObject(call.data, "data");
   std::string new_path = OptionalText(changes, "path").value_or("");
-  if (!new_path.empty()) new_path = FolderPath(new_path);
+  if (!new_path.empty()) new_path = FolderPath("path", new_path);
   const std::optional<std::string> new_id = OptionalText(changes, "id");
   if (new_id.has_value()) (void)IndexId(changes);
   if (new_path.empty() && !new_id.has_value()) RefuseMember("data", "an object with \"id\" or \"path\" or both");
@@ -128,15 +142,12 @@ Json::Value OnIndexStat(CommandCall& call) {
   return result;
 }
 
-constexpr Command kIndexCommands[] = {{"index_create", &OnIndexCreate, false},
-                                      {"index_pause", &OnIndexPause, false},
-                                      {"index_resume", &OnIndexResume, false},
-                                      {"index_delete", &OnIndexDelete, false},
-                                      {"index_rebuild", &OnIndexRebuild, false},
-                                      {"index_rebuilt", &OnIndexRebuilt, false},
-                                      {"index_config_set", &OnIndexConfigSet, false},
-                                      {"index_list", &OnIndexList, false},
-                                      {"index_stat", &OnIndexStat, false}};
+constexpr Command kIndexCommands[] = {
+    {"index_create", &OnIndexCreate, false},   {"index_pause", &OnIndexPause, false},
+    {"index_resume", &OnIndexResume, false},   {"index_delete", &OnIndexDelete, false},
+    {"index_rebuild", &OnIndexRebuild, false}, {"index_rebuilt", &OnIndexRebuilt, false},
+    {"index_share", &OnIndexShare, false},     {"index_config_set", &OnIndexConfigSet, false},
+    {"index_list", &OnIndexList, false},       {"index_stat", &OnIndexStat, false}};
 
 }  // namespace
 

@@ -33,6 +33,7 @@ IndexRecord RecordFrom(const Json::Value& stored) {
   GetJsonValue(record.mount_point, stored, "mount_point", false);
   GetJsonValue(rebuild, stored, "rebuild", false);
   record.rebuild = RebuildState::FromJson(rebuild);
+  record.share = ShareNote::FromJson(stored["share"]);
   record.slot = std::make_shared<IndexSlot>(std::move(mappings));
   return record;
 }
@@ -45,6 +46,7 @@ Json::Value JsonOf(const IndexRecord& record) {
   if (!record.mount_point.empty()) stored["mount_point"] = record.mount_point;
   const Json::Value rebuild = record.rebuild.ToJson();
   if (!rebuild.isNull()) stored["rebuild"] = rebuild;
+  if (record.share != nullptr) stored["share"] = record.share->ToJson();
   if (record.next_id.empty()) return stored;
   stored["next_id"] = record.next_id;
   stored["next_path"] = record.next_path;
@@ -161,6 +163,7 @@ void IndexTable::EndMove(const std::string& id) {
   // Where the file is in neither folder, the new place counts.
   if (moving && (record.path == record.next_path || IsFileExist(IndexFile(record.next_path)) ||
                  !IsFileExist(IndexFile(record.path)))) {
+    if (node.key() != record.next_id) record.share.reset();
     node.key() = record.next_id;
     record.path = record.next_path;
   }

@@ -12,6 +12,7 @@
 #include "common/error.h"
 #include "services/kovaelasticd/indices/index.h"
 #include "services/kovaelasticd/indices/rebuild_state.h"
+#include "services/kovaelasticd/indices/share_note.h"
 #include "services/kovaelasticd/text/schema.h"
 
 namespace ferrox::engine {
@@ -37,6 +38,7 @@ struct IndexRecord {
   std::string next_path;    ///<
   std::string mount_point;  ///< of the volume on which the index was last seen; "": not known
   RebuildState rebuild;
+  ShareNotePtr share;  ///< forgotten when the index gets another id, which is another share's
   std::shared_ptr<IndexSlot> slot;
 };
 

@@ -144,6 +144,13 @@ void Registry::EndRebuild(const std::string& id, int64_t since) {
   RemoveSetAside(IndexFile(record.path));
 }
 
+void Registry::NoteShare(const std::string& id, ShareNote note) {
+  const base::MutexLock change(change_mutex_);
+  const ShareNotePtr known = table_.Find(id).share;
+  if (known != nullptr && *known == note) return;
+  table_.ApplyOrUndo(id, [&](IndexRecord& record) { record.share = std::make_shared<ShareNote>(std::move(note)); });
+}
+
 void Registry::HealDamaged() {
   if (!any_damaged_.exchange(false)) return;
   for (const auto& [id, record] : table_.All()) {
@@ -247,12 +254,14 @@ Registry::OpenIndex Registry::Open(const std::string& id) {
   FERROX_FAIL_IF(!still.has_value() || still->slot != slot, Error::kEngineNoSuchIndex, NoSuchIndex(id));
   FERROX_FAIL_IF(still->paused, Error::kEngineIndexPaused, PausedIndex(id));
   OpenOrHeal(id, *still, *slot);
-  return {id, slot->index, slot->schema, table_.Find(id).rebuild};
+  const IndexRecord record = table_.Find(id);
+  return {id, slot->index, slot->schema, record.rebuild, record.share};
 }
 
 std::vector<Registry::Listed> Registry::List() {
   std::vector<Listed> listed;
-  for (const auto& [id, record] : table_.All()) listed.push_back({id, record.path, record.paused, record.rebuild});
+  for (const auto& [id, record] : table_.All())
+    listed.push_back({id, record.path, record.paused, record.rebuild, record.share});
   return listed;
 }
 

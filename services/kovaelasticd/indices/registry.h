@@ -11,6 +11,7 @@
 #include "services/kovaelasticd/indices/index.h"
 #include "services/kovaelasticd/indices/index_table.h"
 #include "services/kovaelasticd/indices/rebuild_state.h"
+#include "services/kovaelasticd/indices/share_note.h"
 #include "services/kovaelasticd/text/schema.h"
 
 namespace ferrox::engine {
@@ -46,6 +47,9 @@ class Registry {
   void Rebuild(const std::string& id);
   /// The rebuilding that began at `since` is complete; does nothing when another has begun meanwhile.
   void EndRebuild(const std::string& id, int64_t since);
+  /// Notes which share the index is of; costs nothing where that is noted already.
+  /// @throws Error kEngineNoSuchIndex; kEngineStorage, the old note holds then.
+  void NoteShare(const std::string& id, ShareNote note);
   /// Makes the indices anew of which a request has found that they are damaged. Never throws.
   void HealDamaged();
 
@@ -55,6 +59,7 @@ class Registry {
     std::shared_ptr<Index> index;
     std::shared_ptr<const Schema> schema;
     RebuildState rebuild;
+    ShareNotePtr share;
   };
   /// @throws Error kEngineNoSuchIndex, kEngineIndexPaused, kEngineStorage.
   OpenIndex Open(const std::string& id);
@@ -64,6 +69,7 @@ class Registry {
     std::string path;
     bool paused = false;
     RebuildState rebuild;
+    ShareNotePtr share;
   };
   std::vector<Listed> List();
 
