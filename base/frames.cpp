@@ -9,6 +9,9 @@
 #include <algorithm>
 #include <cerrno>
 #include <cstring>
+#include <utility>
+
+#include "base/descriptor_passing.h"
 
 namespace base {
 
@@ -72,10 +75,20 @@ bool SendAll(int fd, Outgoing& frame, int idle_timeout_ms) {
   return true;
 }
 
-bool RecvAll(int fd, char* data, size_t size, int idle_timeout_ms) {
+/// Keeps the first descriptor that comes, if it is wanted; others are closed.
+ssize_t Recv(int fd, char* data, size_t size, UniqueFd* descriptor) {
+  if (descriptor == nullptr) return recv(fd, data, size, 0);
+  int received = -1;
+  const ssize_t got = ReceiveWithDescriptors(fd, data, size, &received, 1);
+  UniqueFd owned(received);
+  if (owned.Valid() && !descriptor->Valid()) *descriptor = std::move(owned);
+  return got;
+}
+
+bool RecvAll(int fd, char* data, size_t size, int idle_timeout_ms, UniqueFd* descriptor = nullptr) {
   while (size > 0) {
     if (idle_timeout_ms >= 0 && !WaitFor(fd, POLLIN, idle_timeout_ms)) return false;
-    const ssize_t got = recv(fd, data, size, 0);
+    const ssize_t got = Recv(fd, data, size, descriptor);
     if (got > 0) {
       data += got;
       size -= static_cast<size_t>(got);
@@ -129,12 +142,12 @@ bool SendFrame(int fd, const std::string& message, uint32_t limit_bytes, int idl
   return SendAll(fd, frame, idle_timeout_ms);
 }
 
-bool RecvFrame(int fd, std::string& message, uint32_t limit_bytes, int idle_timeout_ms) {
+bool RecvFrame(int fd, std::string& message, uint32_t limit_bytes, int idle_timeout_ms, UniqueFd* descriptor) {
   message.clear();
   uint32_t length = 0;
   char header[sizeof(length)];
   errno = 0;
-  if (!RecvAll(fd, header, sizeof(header), idle_timeout_ms)) return false;
+  if (!RecvAll(fd, header, sizeof(header), idle_timeout_ms, descriptor)) return false;
   memcpy(&length, header, sizeof(length));
   if (length > limit_bytes) {
     errno = EMSGSIZE;

@@ -22,6 +22,8 @@ bool SendFrame(int fd, const std::string& message, uint32_t limit_bytes, int idl
 /// Receives one message into `message`, which is empty afterwards when that fails. Blocks until it is complete, at most
 /// `idle_timeout_ms` without a byte (ETIMEDOUT; -1: no limit). A length over `limit_bytes` is refused (EMSGSIZE).
 /// Memory grows with the bytes that have come, not with the length that was announced.
-bool RecvFrame(int fd, std::string& message, uint32_t limit_bytes, int idle_timeout_ms = -1);
+/// @param descriptor not null: gets the descriptor that came with the first byte, close-on-exec, or none
+bool RecvFrame(int fd, std::string& message, uint32_t limit_bytes, int idle_timeout_ms = -1,
+               UniqueFd* descriptor = nullptr);
 
 }  // namespace base

@@ -30,11 +30,11 @@ Outcome WhyCutShort(int error) {
 }
 
 /// One request and its reply, up to the first step that fails.
-Outcome Exchange(FrameClient& client, const std::string& request, std::string& reply,
-                 std::chrono::milliseconds longest) {
+Outcome Exchange(FrameClient& client, const std::string& request, std::string& reply, std::chrono::milliseconds longest,
+                 base::UniqueFd* descriptor) {
   Outcome outcome = client.Connect();
   if (outcome == Outcome::kAnswered) outcome = client.Send(request);
-  return outcome == Outcome::kAnswered ? client.Receive(reply, longest) : outcome;
+  return outcome == Outcome::kAnswered ? client.Receive(reply, longest, descriptor) : outcome;
 }
 
 /// A reply without "success" refuses the request, as one with a false one does.
@@ -56,11 +56,12 @@ Reply ReadReply(const std::string& text) {
   return reply;
 }
 
-Reply Ask(const char* socket, const std::string& request, std::chrono::milliseconds longest) {
+Reply Ask(const char* socket, const std::string& request, std::chrono::milliseconds longest,
+          base::UniqueFd* descriptor = nullptr) {
   FrameClient client(InstancePath(socket));
   std::string text;
   Reply reply;
-  reply.outcome = Exchange(client, request, text, longest);
+  reply.outcome = Exchange(client, request, text, longest, descriptor);
   return reply.outcome == Outcome::kAnswered ? ReadReply(text) : reply;
 }
 
@@ -78,10 +79,10 @@ Outcome FrameClient::Send(const std::string& message) {
   return WhyCutShort(errno);
 }
 
-Outcome FrameClient::Receive(std::string& message, std::chrono::milliseconds longest) {
+Outcome FrameClient::Receive(std::string& message, std::chrono::milliseconds longest, base::UniqueFd* descriptor) {
   const kovadaemon::SocketWait wait(socket_.Get());
   const auto longest_ms = static_cast<int>(longest.count());
-  if (base::RecvFrame(socket_.Get(), message, kMessageMaxBytes, longest_ms)) return Outcome::kAnswered;
+  if (base::RecvFrame(socket_.Get(), message, kMessageMaxBytes, longest_ms, descriptor)) return Outcome::kAnswered;
   return WhyCutShort(errno);
 }
 
@@ -90,12 +91,12 @@ Reply AskEngine(const Json::Value& request, std::chrono::milliseconds longest) {
 }
 
 /// The library's own sender ends its text with the zero byte of a C string, and the daemons read both alike.
-Reply AskDaemon(const char* socket, const std::string& type, const Json::Value& data,
-                std::chrono::milliseconds longest) {
+Reply AskDaemon(const char* socket, const std::string& type, const Json::Value& data, std::chrono::milliseconds longest,
+                base::UniqueFd* descriptor) {
   Json::Value request;
   request["type"] = type;
   request["data"] = data;
-  return Ask(socket, toString(request) + '\0', longest);
+  return Ask(socket, toString(request) + '\0', longest, descriptor);
 }
 
 /// The connection is closed without a request, which costs the daemon nothing.

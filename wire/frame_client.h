@@ -37,7 +37,8 @@ class FrameClient {
   Outcome Send(const std::string& message);
   /// Receives one message of at most 256 MiB. Waits at most `longest` for its first byte, and as long for each piece
   /// that follows. Memory grows with what has come, not with the announced length.
-  Outcome Receive(std::string& message, std::chrono::milliseconds longest);
+  /// @param descriptor not null: gets the descriptor that came with the message, or none
+  Outcome Receive(std::string& message, std::chrono::milliseconds longest, base::UniqueFd* descriptor = nullptr);
 
  private:
   std::string socket_path_;
@@ -57,8 +58,9 @@ struct Reply {
 Reply AskEngine(const Json::Value& request, std::chrono::milliseconds longest);
 /// Sends {"type": type, "data": data} to the daemon that serves `socket`, one of the constants of common/paths.h. It
 /// goes out as the library sends commands, with a zero byte at its end.
-Reply AskDaemon(const char* socket, const std::string& type, const Json::Value& data,
-                std::chrono::milliseconds longest);
+/// @param descriptor not null: gets the descriptor that came with the reply, or none
+Reply AskDaemon(const char* socket, const std::string& type, const Json::Value& data, std::chrono::milliseconds longest,
+                base::UniqueFd* descriptor = nullptr);
 
 /// Whether a process serves the socket, also one that this user may not talk to.
 bool IsServed(const std::string& socket_path);

@@ -25,7 +25,7 @@
 #include "base/files.h"
 #include "services/kovacontentextractd/sandbox.h"
 #include "services/kovacontentextractd/worker_protocol.h"
-#include "services/support/descriptor_passing.h"
+#include "base/descriptor_passing.h"
 
 namespace ferrox::extract {
 
@@ -103,7 +103,7 @@ bool ReceiveRequest(Request& request) {
   std::array<char, 1024> buffer;
   RequestHeader header;
   const ssize_t got =
-      services::ReceiveWithDescriptors(kWorkerSocket, buffer.data(), buffer.size(), &request.source.fd, 1);
+      base::ReceiveWithDescriptors(kWorkerSocket, buffer.data(), buffer.size(), &request.source.fd, 1);
   if (got < static_cast<ssize_t>(sizeof(header)) || request.source.fd < 0) return false;
   memcpy(&header, buffer.data(), sizeof(header));
   request.number = header.number;
@@ -168,7 +168,7 @@ pid_t Fork() { return static_cast<pid_t>(syscall(SYS_clone, CLONE_PARENT | SIGCH
 bool ReceiveFork(int& socket, int& region) {
   char request = 0;
   int descriptors[2];
-  const ssize_t got = services::ReceiveWithDescriptors(kWorkerSocket, &request, sizeof(request), descriptors, 2);
+  const ssize_t got = base::ReceiveWithDescriptors(kWorkerSocket, &request, sizeof(request), descriptors, 2);
   socket = descriptors[0];
   region = descriptors[1];
   return got == 1 && request == kForkRequest && socket >= 0;

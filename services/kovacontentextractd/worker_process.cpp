@@ -17,7 +17,7 @@
 #include "services/kovacontentextractd/region.h"
 #include "services/kovacontentextractd/worker_protocol.h"
 #include "services/kovacontentextractd/worker_template.h"
-#include "services/support/descriptor_passing.h"
+#include "base/descriptor_passing.h"
 
 namespace ferrox::extract {
 
@@ -78,7 +78,7 @@ bool WorkerProcess::Send(const Task& task) {
                                 ++requests_};
   std::string bytes(reinterpret_cast<const char*>(&header), sizeof(header));
   bytes += task.reader + task.extension + task.name;
-  return services::SendWithDescriptors(socket_.Get(), bytes, {task.fd});
+  return base::SendWithDescriptors(socket_.Get(), bytes, {task.fd});
 }
 
 /// An answer to the last request, or the greeting to request 0: a head, then its JSON text.

@@ -15,7 +15,7 @@
 #include "common/error.h"
 #include "common/log.h"
 #include "services/kovacontentextractd/worker_protocol.h"
-#include "services/support/descriptor_passing.h"
+#include "base/descriptor_passing.h"
 
 namespace ferrox::extract {
 
@@ -75,7 +75,7 @@ bool WorkerTemplate::IsReady() const {
 /// The first one waits for the program to be loaded. The template answers with a process number that is a child of this
 /// process, since it forks with CLONE_PARENT.
 pid_t WorkerTemplate::Fork(int socket, int region) {
-  const bool asked = services::SendWithDescriptors(socket_.Get(), std::string_view(&kForkRequest, 1), {socket, region});
+  const bool asked = base::SendWithDescriptors(socket_.Get(), std::string_view(&kForkRequest, 1), {socket, region});
   pollfd state = {socket_.Get(), POLLIN, 0};
   int ready;
   do {

@@ -8,7 +8,7 @@
 #include <cstring>
 #include <utility>
 
-#include "services/support/descriptor_passing.h"
+#include "base/descriptor_passing.h"
 
 namespace ferrox::services {
 
@@ -22,7 +22,7 @@ std::optional<uint32_t> FrameConnection::BodyBytes() const {
 ssize_t FrameConnection::ReceiveBytes(Chunk& chunk, size_t size, bool takes_descriptors) {
   if (!takes_descriptors) return read(fd.Get(), chunk.data(), size);
   int received = -1;
-  const ssize_t got = ReceiveWithDescriptors(fd.Get(), chunk.data(), size, &received, 1);
+  const ssize_t got = base::ReceiveWithDescriptors(fd.Get(), chunk.data(), size, &received, 1);
   if (received >= 0) {
     descriptor.Reset(received);
     peer.descriptor = received;

@@ -6,7 +6,7 @@
 #include <initializer_list>
 #include <string_view>
 
-namespace ferrox::services {
+namespace base {
 
 /// The most descriptors that go with one message.
 inline constexpr size_t kPassedMax = 2;
@@ -18,4 +18,4 @@ bool SendWithDescriptors(int socket, std::string_view bytes, std::initializer_li
 /// `count`, and of more all are dropped. @return as read() does
 ssize_t ReceiveWithDescriptors(int socket, void* to, size_t size, int* descriptors, size_t count);
 
-}  // namespace ferrox::services
+}  // namespace base

@@ -1,4 +1,4 @@
-#include "services/support/descriptor_passing.h"
+#include "base/descriptor_passing.h"
 
 #include <sys/socket.h>
 #include <unistd.h>
@@ -7,7 +7,7 @@
 #include <cerrno>
 #include <cstring>
 
-namespace ferrox::services {
+namespace base {
 
 namespace {
 
@@ -65,4 +65,4 @@ ssize_t ReceiveWithDescriptors(int socket, void* to, size_t size, int* descripto
   return got;
 }
 
-}  // namespace ferrox::services
+}  // namespace base
