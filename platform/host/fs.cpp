@@ -91,7 +91,7 @@ constexpr FuseRow kFuseTypes[] = {
 };
 
 int FuseType(const std::string& path) {
-  const std::string mounted = kova::host::MountedType(path);
+  const std::string mounted = kova::host::MountedAt(path).type;
   if (mounted == "fuseblk") return KOVA_FS_NTFS;
   const std::string name = mounted.compare(0, 5, "fuse.") == 0 ? mounted.substr(5) : mounted;
   for (const FuseRow& row : kFuseTypes) {

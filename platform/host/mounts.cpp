@@ -39,8 +39,8 @@ bool GetKey(const std::string& path, MountKey& key) {
   return true;
 }
 
-/// The type in one line: "36 35 98:0 /root /mount/point options [more]... - ext4 source options".
-bool TypeInLine(const std::string& line, const MountKey& key, std::string& type) {
+/// The end of one line: "36 35 98:0 /root /mount/point options [more]... - ext4 source options".
+bool IsInLine(const std::string& line, const MountKey& key, Mounted& mounted) {
   unsigned long long id = 0;
   char device[32] = "";
   if (sscanf(line.c_str(), "%llu %*u %31s", &id, device) != 2) return false;
@@ -48,19 +48,20 @@ bool TypeInLine(const std::string& line, const MountKey& key, std::string& type)
   const size_t separator = line.find(" - ");
   if (separator == std::string::npos) return false;
   const size_t begin = separator + 3;
-  type = line.substr(begin, line.find(' ', begin) - begin);
+  mounted.type = line.substr(begin, line.find(' ', begin) - begin);
+  mounted.options = line.substr(line.rfind(' ') + 1);  // the source before it may be empty
   return true;
 }
 
 }  // namespace
 
-std::string MountedType(const std::string& path) {
+Mounted MountedAt(const std::string& path) {
   MountKey key;
   if (!GetKey(path, key)) return {};
   std::ifstream table("/proc/self/mountinfo");
-  std::string line, type;
-  while (std::getline(table, line)) {
-    if (TypeInLine(line, key, type)) return type;
+  Mounted mounted;
+  for (std::string line; std::getline(table, line);) {
+    if (IsInLine(line, key, mounted)) return mounted;
   }
   return {};
 }

@@ -7,9 +7,12 @@
 /// table is that of this process's mount namespace.
 namespace kova::host {
 
-/// The file-system type that the mount table gives for the mount of `path`, for example "fuse.sshfs"; empty when the
-/// table does not tell.
-std::string MountedType(const std::string& path);
+/// What the mount table tells of the mount of a path; empty texts when it does not tell.
+struct Mounted {
+  std::string type;     ///< for example "fuse.sshfs"
+  std::string options;  ///< of the file system itself, for example "rw,user_id=0,default_permissions"
+};
+Mounted MountedAt(const std::string& path);
 
 /// 1 when a mount begins at `path`, 0 when not, below 0 with errno. Links are not followed.
 int IsMountRoot(const std::string& path);

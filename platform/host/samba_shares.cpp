@@ -15,6 +15,7 @@
 #include "platform/host/run_program.h"
 #include "platform/host/samba_files.h"
 #include "platform/host/share_rules.h"
+#include "platform/host/share_users.h"
 #include "platform/host/stat_cache.h"
 
 namespace kova::host {
@@ -73,6 +74,8 @@ bool TakeSection(const SmbConf& conf, const std::string& section, ShareEntry& sh
   share.hide_unreadable = conf.IsOn(section, "hide unreadable");
   // Samba lets nobody write unless "read only" is off. Whether the host itself can write depends on the volume.
   share.ftp_privilege = SmbConf::Boolean(value("read only")) == false ? 2 : 1;
+  share.users = SambaUsers(conf, section);
+  share.foreign_rights = SambaRightsProblem(conf, section);
   if (!HasRecycle(value("vfs objects"))) return true;
   share.recycle = RecycleFolder(value("recycle:repository"));
   if (share.recycle.find('%') != std::string::npos) {

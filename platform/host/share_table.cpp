@@ -31,6 +31,27 @@ StatCache<ShareTable>& Cache() {
   return *cache;
 }
 
+/// Names of files as Samba's lists have them, "/.DS_Store/~*/"; nothing here goes by them.
+bool ReadPatterns(const Json::Value& object) {
+  for (const char* member : {"veto_files", "hide_files"}) {
+    std::string patterns;
+    if (!ReadMember(object, member, patterns)) return false;
+    if (!patterns.empty() && (patterns.size() < 2 || patterns.front() != '/' || patterns.back() != '/')) return false;
+  }
+  return true;
+}
+
+/// What is wrong with a list of users; empty when nothing is. A group of the table is one of the name service: only
+/// Samba has netgroups.
+std::string CheckUserNames(std::vector<std::string>& names) {
+  for (std::string& name : names) {
+    const std::string problem = UserNameProblem(name);
+    if (!problem.empty()) return problem;
+    if (name.front() == '@') name.front() = '+';
+  }
+  return {};
+}
+
 /// What is wrong with one element of the table; empty when it was read.
 std::string ReadEntry(const Json::Value& object, ShareEntry& entry) {
   if (!object.isObject()) return "is not an object";
@@ -38,8 +59,14 @@ std::string ReadEntry(const Json::Value& object, ShareEntry& entry) {
                     ReadMember(object, "recycle", entry.recycle) && ReadMember(object, "encrypted", entry.encrypted) &&
                     ReadMember(object, "locked", entry.locked) && ReadMember(object, "read_only", entry.read_only) &&
                     ReadMember(object, "hide_unreadable", entry.hide_unreadable) &&
-                    ReadMember(object, "ftp_privilege", entry.ftp_privilege);
-  if (!read) return "has a member of the wrong type";
+                    ReadMember(object, "ftp_privilege", entry.ftp_privilege) &&
+                    ReadMember(object, "valid_users", entry.users.valid) &&
+                    ReadMember(object, "invalid_users", entry.users.invalid);
+  if (!read || !ReadPatterns(object)) return "has a member of the wrong type";
+  for (std::vector<std::string>* names : {&entry.users.valid, &entry.users.invalid}) {
+    const std::string problem = CheckUserNames(*names);
+    if (!problem.empty()) return "has a list of users that " + problem;
+  }
   while (entry.path.size() > 1 && entry.path.back() == '/') entry.path.pop_back();
   const std::string problem = ShareTextProblem(entry.name, entry.path);
   return problem.empty() ? problem : "is not valid: " + problem;

@@ -7,9 +7,12 @@
 #include <unordered_map>
 #include <vector>
 
+#include "platform/host/share_users.h"
+
 /// The host's shares: the JSON array in "/etc/kova/shares.json" below the instance's root. Each element is an object:
 ///   {"name": "photo", "path": "/volume1/photo", "recycle": "#recycle", "encrypted": false, "locked": false,
-///    "read_only": false, "hide_unreadable": false, "ftp_privilege": 2}
+///    "read_only": false, "hide_unreadable": false, "ftp_privilege": 2, "valid_users": ["ann", "@staff"],
+///    "invalid_users": [], "veto_files": "/.DS_Store/", "hide_files": ""}
 /// "name" and "path" are required, the others are written when they differ from the values in ShareEntry. Other members
 /// are kept. A missing file is an empty table.
 namespace kova::host {
@@ -25,6 +28,9 @@ struct ShareEntry {
   bool read_only = false;
   bool hide_unreadable = false;
   uint32_t ftp_privilege = 2;
+  ShareUsers users = {};
+  /// Why the rights of its files do not tell who may read it, as far as its configuration shows; empty when they do.
+  std::string foreign_rights = {};
   bool from_samba = false;  ///< read from Samba's configuration, not from the table
 };
 

@@ -11,12 +11,15 @@
 #include <gtest/gtest.h>
 
 #include <kova/error.h>
+#include <kova/fs.h>
 #include <kova/recycle.h>
 #include <kova/samba.h>
 #include <kova/share.h>
 
 #include "platform/host/samba_shares.h"
+#include "platform/host/share_search.h"
 #include "platform/host/share_table.h"
+#include "platform/host/share_users.h"
 #include "platform/host/smb_conf.h"
 #include "tests/contract/host_log.h"
 #include "tests/contract/in_child.h"
@@ -208,6 +211,97 @@ TEST_F(HostSambaTest, WhatTestparmTellsBecomesShares) {
   ASSERT_EQ(2U, problems.size());
   EXPECT_NE(string::npos, problems[0].find("Samba's share \"me\" is left out: its path /srv/%U/me differs"));
   EXPECT_NE(string::npos, problems[1].find("Samba's share \"own\": its recycle bin %U differs"));
+}
+
+TEST_F(HostSambaTest, ShareRulesAreReadOrCloseTheShare) {
+  const struct {
+    const char* lines;
+    const char* users;  ///< the valid ones, a bar, and the invalid ones; or why the share is closed
+    const char* foreign_rights = "";
+  } rows[] = {
+      {"", "|nobody"},
+      {"guest ok = yes", "|"},
+      {"force user = root\nadmin users = eve\nforce group = +wheel\nguest only = yes\nguest ok = yes", "|"},
+      {"valid users = ann, bob @staff\nguest ok = yes", "ann bob @staff|"},
+      {"valid users = \"@CORP\\domain users\" +\"two words\" CORP\\ann",
+       "@CORP\\domain users +two words CORP\\ann|nobody"},
+      {"invalid users = root @wheel +adm", "|root @wheel +adm nobody"},
+      {"valid users = ann\ninvalid users = %S", "rule \"invalid users\" has a macro"},
+      {"valid users = %U ann", "rule \"valid users\" has a macro"},
+      {"valid users = &net", "names a netgroup (&net)"},
+      {"invalid users = ann +&net", "names a netgroup (+&net)"},
+      {"valid users = \"ann bob", "quotation marks without an end"},
+      {"valid users = ann @", "has an empty name"},
+      {"valid users = S-1-5-21-1", "names a security id"},
+      {"hosts allow = 10.0.0.0/8", "\"hosts allow\" goes by the host"},
+      {"hosts deny = all", "\"hosts deny\" goes by the host"},
+      {"vfs objects = catia acl_xattr:x", "module acl_xattr may refuse more"},
+      {"vfs objects = acl_tdb\nacl_tdb:ignore system acls = yes", "module acl_tdb", "module acl_tdb keeps rights"},
+      {"vfs objects = nfs4acl_xattr", "|nobody", "module nfs4acl_xattr keeps rights"},
+  };
+  for (const auto& row : rows) {
+    const SmbConf conf(string("[global]\n[s]\n") + row.lines + "\n[t]\nvalid users = other\n");
+    const kova::host::ShareUsers users = kova::host::SambaUsers(conf, "s");
+    string told = users.closed;
+    if (told.empty()) {
+      for (const string& name : users.valid) told += (told.empty() ? "" : " ") + name;
+      told += "|";
+      for (const string& name : users.invalid) told += (told.back() == '|' ? "" : " ") + name;
+      EXPECT_EQ(row.users, told) << row.lines;
+    }
+    EXPECT_NE(string::npos, told.find(row.users)) << row.lines << ": " << told;
+    EXPECT_TRUE(users.closed.empty() || (users.valid.empty() && users.invalid.empty())) << row.lines;
+    const string problem = kova::host::SambaRightsProblem(conf, "s");
+    EXPECT_NE(string::npos, problem.find(row.foreign_rights)) << problem;
+    EXPECT_EQ(problem.empty(), *row.foreign_rights == '\0') << problem;
+  }
+  const SmbConf everywhere("[global]\nhosts allow = 10.\nguest account = visitor\n[s]\npath = /s\n");
+  EXPECT_FALSE(kova::host::SambaUsers(everywhere, "s").closed.empty());
+}
+
+TEST_F(HostSambaTest, TheSearchEngineIsToldOfSambasRulesAndOfTheTables) {
+  const string testparm = Program("testparm", "exec cat " + conf_);
+  WriteFile(conf_, "[video]\n valid users = ann\n path = " + Folder("video") + "\n");
+  Configure("\"shares\": true, \"testparm\": \"" + testparm + "\"");
+  kova::host::ShareForSearch found;
+  ASSERT_TRUE(kova::host::FindShareForSearch("video", found));
+  EXPECT_EQ(dir_ / "video", found.root);
+  EXPECT_EQ("", found.refused);
+  EXPECT_EQ("ann", found.rules["valid_users"][0].asString());
+  const string table = TestRoot() + "/etc/kova/shares.json";
+  const auto write = [&](const string& members) {
+    WriteFile(table, R"([{"name": "music", "path": ")" + Folder("music") + "\", " + members + "}]");
+    return kova::host::FindShareForSearch("music", found);
+  };
+  ASSERT_TRUE(write(R"("valid_users": ["ann", "@staff"], "veto_files": "/.x*/")"));
+  EXPECT_EQ("+staff", found.rules["valid_users"][1].asString()) << "no netgroup: only Samba has those";
+  for (const char* damaged : {R"("valid_users": "ann")", R"("invalid_users": ["&net"])", R"("veto_files": ".x")"}) {
+    EXPECT_FALSE(write(damaged)) << damaged;
+  }
+  std::filesystem::remove(table);
+}
+
+TEST(FileSystemRightsTest, OnlyRightsThatTheKernelChecksCount) {
+  const struct {
+    int type;
+    const char *mounted_type, *options;
+    bool refused;
+  } rows[] = {{KOVA_FS_EXT, "ext4", "rw", false},
+              {KOVA_FS_UNKNOWN, "bcachefs", "rw", false},
+              {KOVA_FS_FAT, "vfat", "rw,uid=5", true},
+              {KOVA_FS_NTFS, "ntfs3", "rw", true},
+              {KOVA_FS_NTFS, "fuseblk", "rw,allow_other", true},
+              {KOVA_FS_NTFS, "fuseblk", "rw,default_permissions,allow_other", false},
+              {KOVA_FS_FUSE, "fuse.bindfs", "rw,no_default_permissions", true},
+              {KOVA_FS_FUSE, "virtiofs", "rw", false},
+              {KOVA_FS_FUSE_REMOTE, "fuse.sshfs", "rw,default_permissions", true},
+              {KOVA_FS_CIFS, "cifs", "rw", true},
+              {KOVA_FS_NFS, "nfs4", "rw", true},
+              {KOVA_FS_UNKNOWN, "9p", "rw", true}};
+  for (const auto& row : rows) {
+    const string problem = kova::host::FileSystemRightsProblem(row.type, row.mounted_type, row.options);
+    EXPECT_EQ(row.refused, !problem.empty()) << row.mounted_type << " " << row.options;
+  }
 }
 
 TEST_F(HostSambaTest, SharesFollowTheFilesThatTheyComeFrom) {

@@ -1,0 +1,71 @@
+#include "platform/host/share_search.h"
+
+#include <memory>
+#include <vector>
+
+#include <kova/fs.h>
+
+#include "platform/host/mounts.h"
+#include "platform/host/share_table.h"
+
+namespace kova::host {
+
+namespace {
+
+Json::Value NameList(const std::vector<std::string>& names) {
+  Json::Value list(Json::arrayValue);
+  for (const std::string& name : names) list.append(name);
+  return list;
+}
+
+Json::Value RulesOf(const ShareUsers& users) {
+  Json::Value rules;
+  rules["valid_users"] = NameList(users.valid);
+  rules["invalid_users"] = NameList(users.invalid);
+  if (!users.closed.empty()) rules["closed"] = users.closed;
+  return rules;
+}
+
+/// Whether an option stands in a list such as "rw,default_permissions".
+bool HasOption(const std::string& options, const std::string& wanted) {
+  return ("," + options + ",").find("," + wanted + ",") != std::string::npos;
+}
+
+/// Of the file system that holds a share's folder. One that cannot be asked tells nothing.
+std::string RightsProblemAt(const std::string& root) {
+  const int type = KOVAGetFSType(root.c_str(), 0);
+  if (type < 0) return "the file system of " + root + " cannot be asked who may read its files";
+  const Mounted mounted = MountedAt(root);
+  return FileSystemRightsProblem(type, mounted.type, mounted.options);
+}
+
+}  // namespace
+
+/// virtiofs has the kernel check each file's rights, and shows no option for it.
+std::string FileSystemRightsProblem(int type, const std::string& mounted_type, const std::string& options) {
+  const bool fuse = mounted_type.starts_with("fuse");
+  if (fuse && !HasOption(options, "default_permissions")) {
+    return "the file system " + mounted_type +
+           " is mounted without default_permissions, and decides by itself who may "
+           "read its files";
+  }
+  if (KOVAFSIsRemoteFS(type) == 1 || mounted_type == "9p") {
+    return "its files lie on another machine, which decides who may read them";
+  }
+  if ((type == KOVA_FS_FAT || type == KOVA_FS_NTFS) && !fuse) {
+    return "the file system " + mounted_type + " keeps no rights of files";
+  }
+  return {};
+}
+
+bool FindShareForSearch(const std::string& name, ShareForSearch& found) {
+  const std::shared_ptr<const ShareTable> table = ShareTable::Current();
+  const ShareEntry* entry = table != nullptr ? table->ByName(name) : nullptr;
+  if (entry == nullptr) return false;
+  found.root = entry->path;
+  found.refused = entry->foreign_rights.empty() ? RightsProblemAt(entry->path) : entry->foreign_rights;
+  found.rules = RulesOf(entry->users);
+  return true;
+}
+
+}  // namespace kova::host
