@@ -9,6 +9,7 @@
 #include "services/kovaelasticd/search/path_condition.h"
 #include "services/kovaelasticd/store/access_records.h"
 #include "services/kovaelasticd/store/fts.h"
+#include "services/kovaelasticd/store/length_class.h"
 #include "tests/engine/store_helpers.h"
 #include "tests/support/temp_dir.h"
 
@@ -154,10 +155,14 @@ class StoreModel {
     std::string folder = Path();
     if (folder.find("//") != folder.npos || folder.back() == '/') folder = "/a";
     DocSet all, found;
-    Statement rows = reader->database.Prepare("SELECT id, folder, access FROM docs");
+    Statement rows = reader->database.Prepare("SELECT id, folder, access, text_bytes, leaf FROM docs");
     while (rows.Step()) {
-      const Place place = places->Documents().At(static_cast<size_t>(rows.Int(0)));
-      ASSERT_TRUE(place.folder == rows.Int(1) && place.access == rows.Int(2)) << rows.Int(0);
+      const auto number = static_cast<size_t>(rows.Int(0));
+      const Place place = places->Documents().At(number);
+      ASSERT_TRUE(place.folder == rows.Int(1) && place.access == rows.Int(2)) << number;
+      ASSERT_TRUE((place.length != 0) == (rows.Int(3) != 0)) << number;
+      ASSERT_LE(std::abs(LengthOfClass(static_cast<uint8_t>(place.length)) - rows.Int(3)), rows.Int(3) / 16) << number;
+      ASSERT_EQ(NameHash(rows.Text(4)), places->Documents().NameAt(number)) << number;
       all.Add(rows.Int(0));
     }
     if (reader->hidden != nullptr) all.Subtract(*reader->hidden);

@@ -3,6 +3,8 @@
 #include <algorithm>
 #include <string>
 
+#include "services/kovaelasticd/store/length_class.h"
+
 namespace ferrox::engine {
 
 namespace {
@@ -11,23 +13,34 @@ constexpr auto kPlacesInPart = static_cast<int64_t>(PlaceList::kPart);
 /// From so many changed places of a part on, one pass over all of its rows is cheaper.
 constexpr int64_t kReadAllFrom = 64;
 
-Place PlaceOfRow(const Statement& row) {
-  return {static_cast<uint32_t>(row.Int(1)), static_cast<uint32_t>(row.Int(2))};
+/// Number, folder, access record, bytes of text, name.
+void PutRow(const Statement& row, int64_t first, PlaceList::Part& part) {
+  const auto at = static_cast<size_t>(row.Int(0) - first);
+  const int64_t access = row.Int(2);
+  Place& place = part.places[at];
+  place.folder = static_cast<uint32_t>(row.Int(1));
+  place.access = static_cast<uint32_t>(access > Place::kAccessMax ? 0 : access) & Place::kAccessMax;
+  place.length = LengthClass(row.Int(3));
+  part.names[at] = NameHash(row.Text(4));
 }
 
 }  // namespace
 
-const PlaceWriter::List PlaceWriter::kDocuments = {0, "SELECT id, folder, access FROM docs WHERE id = ?1",
-                                                   "SELECT id, folder, access FROM docs WHERE id BETWEEN ?1 AND ?2"};
-const PlaceWriter::List PlaceWriter::kFolders = {1, "SELECT id, parent, access FROM folders WHERE id = ?1",
-                                                 "SELECT id, parent, access FROM folders WHERE id BETWEEN ?1 AND ?2"};
+const PlaceWriter::List PlaceWriter::kDocuments = {
+    0, "SELECT id, folder, access, text_bytes, leaf FROM docs WHERE id = ?1",
+    "SELECT id, folder, access, text_bytes, leaf FROM docs WHERE id BETWEEN ?1 AND ?2"};
+const PlaceWriter::List PlaceWriter::kFolders = {
+    1, "SELECT id, parent, access, 0, name FROM folders WHERE id = ?1",
+    "SELECT id, parent, access, 0, name FROM folders WHERE id BETWEEN ?1 AND ?2"};
 
 void PlaceWriter::MakeTable() {
-  if (database_.QueryInt("SELECT count(*) FROM sqlite_master WHERE name = 'places'") != 0) return;
+  if (database_.QueryInt("SELECT count(*) FROM sqlite_master WHERE name = 'locations'") != 0) return;
   database_.Execute("BEGIN IMMEDIATE");
   try {
-    database_.Execute("CREATE TABLE places(part INTEGER PRIMARY KEY, version INTEGER NOT NULL, packed BLOB NOT NULL)");
-    database_.Execute("CREATE INDEX places_version ON places(version)");
+    database_.Execute("DROP TABLE IF EXISTS places");  // the same with less in it, which files had before
+    database_.Execute(
+        "CREATE TABLE locations(part INTEGER PRIMARY KEY, version INTEGER NOT NULL, packed BLOB NOT NULL)");
+    database_.Execute("CREATE INDEX locations_version ON locations(version)");
     const auto fill = [this](const List& list, int64_t last) {
       for (int64_t number = 0; number <= last / kPlacesInPart; ++number) UpdatePart(list, number, nullptr, nullptr, 0);
     };
@@ -71,24 +84,26 @@ void PlaceWriter::UpdatePart(const List& list, int64_t number, const int64_t* be
   PlaceList::Part part = {};
   std::string before;
   {
-    Statement row = database_.Prepare("SELECT packed FROM places WHERE part = ?1");
+    Statement row = database_.Prepare("SELECT packed FROM locations WHERE part = ?1");
     if (row.Bind(1, key).Step()) before = row.Text(0);
   }
   if (begin == end || end - begin >= kReadAllFrom) {
     Statement rows = database_.Prepare(list.range);
     rows.Bind(1, first).Bind(2, first + kPlacesInPart - 1);
-    while (rows.Step()) part[static_cast<size_t>(rows.Int(0) - first)] = PlaceOfRow(rows);
+    while (rows.Step()) PutRow(rows, first, part);
   } else {
     if (!UnpackPlaces(before, part)) database_.Fail(SQLITE_CORRUPT);
     for (; begin != end; ++begin) {
+      const auto at = static_cast<size_t>(*begin - first);
+      part.places[at] = {};
       Statement row = database_.Prepare(list.one);
-      part[static_cast<size_t>(*begin - first)] = row.Bind(1, *begin).Step() ? PlaceOfRow(row) : Place();
+      if (row.Bind(1, *begin).Step()) PutRow(row, first, part);
     }
   }
   const std::string packed = PackPlaces(part);
   if (packed == before) return;
   Statement write = database_.Prepare(
-      "INSERT INTO places(part, version, packed) VALUES(?1, ?2, ?3)"
+      "INSERT INTO locations(part, version, packed) VALUES(?1, ?2, ?3)"
       " ON CONFLICT(part) DO UPDATE SET version = excluded.version, packed = excluded.packed");
   write.Bind(1, key).Bind(2, version).BindBlob(3, packed).Run();
 }

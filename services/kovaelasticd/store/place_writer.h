@@ -9,10 +9,10 @@
 
 namespace ferrox::engine {
 
-/// Keeps the table "places", which repeats where documents and folders lie and whose access they have: their rows are
-/// too many, and each too long, to be read for that. A row of it has PlaceList::kPart places, and the version of the
-/// commit that changed it last. For the thread that writes, within its transaction; members that read or write throw
-/// Error kEngineStorage.
+/// Keeps the table "locations", which repeats where documents and folders lie, whose access they have, how long their
+/// texts are, and hashes of their names: their rows are too many, and each too long, to be read for that. A row of it
+/// has PlaceList::kPart places, and the version of the commit that changed it last. For the thread that writes, within
+/// its transaction; members that read or write throw Error kEngineStorage.
 class PlaceWriter {
  public:
   /// `database` must outlive this.

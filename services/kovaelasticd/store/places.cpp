@@ -1,23 +1,57 @@
 #include "services/kovaelasticd/store/places.h"
 
+#include <cstring>
+
+#include "services/kovaelasticd/store/folder_tree.h"
 #include "services/kovaelasticd/store/packed_numbers.h"
 
 namespace ferrox::engine {
 
-void PlaceList::Put(size_t part, const Part& places) {
+namespace {
+
+/// Joins the key of what is above with a name. Every bit of both counts for every bit of the result.
+uint64_t JoinKeys(uint64_t above, uint64_t name) {
+  uint64_t key = (above ^ name) * 0x9E3779B97F4A7C15U;
+  key = (key ^ key >> 32) * 0xD6E8FEB86659FD93U;
+  return key ^ key >> 32;
+}
+
+/// CutSigned, with a short way for the common numbers of one byte.
+bool CutStep(std::string_view& bytes, int64_t& step) {
+  if (bytes.empty() || static_cast<unsigned char>(bytes.front()) >= 0x80) return CutSigned(bytes, step);
+  step = Unzigzag(static_cast<unsigned char>(bytes.front()));
+  bytes.remove_prefix(1);
+  return true;
+}
+
+constexpr size_t kNameBytes = sizeof(uint32_t);
+
+}  // namespace
+
+uint32_t NameHash(std::string_view name) {
+  uint32_t hash = 2166136261U;
+  for (const char c : name) hash = (hash ^ static_cast<unsigned char>(c)) * 16777619U;
+  return hash;
+}
+
+void PlaceList::Put(size_t part, int64_t version, std::shared_ptr<const Part> places) {
   if (part >= parts_.size()) parts_.resize(part + 1);
-  parts_[part] = std::make_shared<const Part>(places);
+  parts_[part] = {std::move(places), version};
 }
 
 std::string PackPlaces(const PlaceList::Part& part) {
-  size_t end = part.size();
-  while (end > 0 && part[end - 1].folder == 0 && part[end - 1].access == 0) --end;
+  size_t end = part.places.size();
+  while (end > 0 && part.places[end - 1].folder == 0 && part.places[end - 1].access == 0) --end;
   std::string packed;
   Place before;
   for (size_t i = 0; i < end; ++i) {
-    PutSigned(packed, int64_t{part[i].folder} - before.folder);
-    PutSigned(packed, int64_t{part[i].access} - before.access);
-    before = part[i];
+    const Place& place = part.places[i];
+    PutSigned(packed, int64_t{place.folder} - before.folder);
+    PutSigned(packed, int64_t{place.access} - int64_t{before.access});
+    before = place;
+    if (place.folder == 0) continue;
+    packed += static_cast<char>(place.length);
+    for (size_t byte = 0; byte < kNameBytes; ++byte) packed += static_cast<char>(part.names[i] >> (8 * byte));
   }
   return packed;
 }
@@ -25,27 +59,69 @@ std::string PackPlaces(const PlaceList::Part& part) {
 bool UnpackPlaces(std::string_view packed, PlaceList::Part& part) {
   int64_t folder = 0, access = 0;
   size_t i = 0;
-  for (; !packed.empty() && i < part.size(); ++i) {
+  part = {};
+  for (; !packed.empty() && i < part.places.size(); ++i) {
     int64_t folder_step = 0, access_step = 0;
-    if (!CutSigned(packed, folder_step) || !CutSigned(packed, access_step)) return false;
+    if (!CutStep(packed, folder_step) || !CutStep(packed, access_step)) return false;
     folder += folder_step;
     access += access_step;
-    part[i] = {static_cast<uint32_t>(folder), static_cast<uint32_t>(access)};
+    Place& place = part.places[i];
+    place.folder = static_cast<uint32_t>(folder);
+    place.access = static_cast<uint32_t>(access) & Place::kAccessMax;
+    if (folder == 0) continue;
+    if (packed.size() < 1 + kNameBytes) return false;
+    place.length = static_cast<uint8_t>(packed[0]);
+    for (size_t byte = kNameBytes; byte > 0; --byte) {
+      part.names[i] = part.names[i] << 8 | static_cast<unsigned char>(packed[byte]);
+    }
+    packed.remove_prefix(1 + kNameBytes);
   }
-  for (; i < part.size(); ++i) part[i] = {};
   return packed.empty();
+}
+
+const std::vector<uint64_t>& FolderKeys::Of(const PlaceList& folders) {
+  const base::MutexLock guard(mutex_);
+  if (made_) return keys_;
+  keys_.assign(folders.End(), 0);
+  if (keys_.size() > FolderTree::kTop) keys_[FolderTree::kTop] = 1;
+  std::vector<bool> known(keys_.size(), false);
+  if (known.size() > FolderTree::kTop) known[0] = known[FolderTree::kTop] = true;
+  std::vector<uint32_t> way;
+  for (size_t start = 0; start < keys_.size(); ++start) {
+    for (auto folder = static_cast<uint32_t>(start); folder < known.size() && !known[folder];
+         folder = folders.At(folder).folder) {
+      known[folder] = true;  // ends the way where a damaged file has a circle
+      way.push_back(folder);
+    }
+    for (; !way.empty(); way.pop_back()) {
+      const uint32_t folder = way.back(), above = folders.At(folder).folder;
+      if (above < keys_.size() && keys_[above] != 0) keys_[folder] = JoinKeys(keys_[above], folders.NameAt(folder)) | 1;
+    }
+  }
+  made_ = true;
+  return keys_;
+}
+
+uint64_t PathKeys::Of(int64_t document) const {
+  const auto number = static_cast<size_t>(document);
+  const uint32_t folder = documents_.At(number).folder;
+  return folder < folder_keys_.size() ? JoinKeys(folder_keys_[folder], documents_.NameAt(number)) : 0;
 }
 
 std::shared_ptr<const Places> Places::Load(Database& database, int64_t version, const Places* before) {
   const auto places = before == nullptr ? std::make_shared<Places>() : std::make_shared<Places>(*before);
-  Statement changed = database.Prepare("SELECT part, packed FROM places WHERE version > ?1");
+  Statement changed = database.Prepare("SELECT part, version, packed FROM locations WHERE version > ?1");
   changed.Bind(1, places->version_);
-  PlaceList::Part part;
+  bool other_folders = before == nullptr;
   while (changed.Step()) {
-    if (!UnpackPlaces(changed.Text(1), part)) database.Fail(SQLITE_CORRUPT);
+    const auto part = std::make_shared<PlaceList::Part>();
+    if (!UnpackPlaces(changed.Text(2), *part)) database.Fail(SQLITE_CORRUPT);
     const auto number = static_cast<size_t>(changed.Int(0));
-    (number % 2 == 0 ? places->documents_ : places->folders_).Put(number / 2, part);
+    const bool is_folders = number % 2 != 0;
+    other_folders = other_folders || is_folders;
+    (is_folders ? places->folders_ : places->documents_).Put(number / 2, changed.Int(1), part);
   }
+  if (other_folders) places->folder_keys_ = std::make_shared<FolderKeys>();
   places->version_ = version;
   return places;
 }
