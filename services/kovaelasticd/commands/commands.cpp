@@ -27,11 +27,11 @@ Json::Value OnPing(CommandCall& /*call*/) {
   return result;
 }
 
-constexpr Command kOtherCommands[] = {{"access_set", &RunAccessSet, false},
-                                      {"commit", &OnCommit, false},
-                                      {"update_term_suggestion", &OnUpdateTermSuggestion, false},
-                                      {"search", &RunSearch, false},
-                                      {"ping", &OnPing, true}};
+constexpr Command kOtherCommands[] = {{"access_set", &RunAccessSet, Users::kPrivileged},
+                                      {"commit", &OnCommit, Users::kPrivileged},
+                                      {"update_term_suggestion", &OnUpdateTermSuggestion, Users::kPrivileged},
+                                      {"search", &RunSearch, Users::kPrivileged},
+                                      {"ping", &OnPing, Users::kEveryone}};
 
 }  // namespace
 

@@ -5,6 +5,7 @@
 
 #include <json/value.h>
 
+#include "services/kovaelasticd/commands/caller.h"
 #include "services/kovaelasticd/indices/registry.h"
 
 namespace ferrox::engine {
@@ -16,6 +17,7 @@ namespace ferrox::engine {
 /// One command of a request.
 struct CommandCall {
   Registry& registry;
+  const Caller& caller;
   Json::Value& data;  ///< the request's "data", an object; the command may move values out of it
 };
 
@@ -23,10 +25,13 @@ struct CommandCall {
 /// @throws Error with the reply's code and sentence.
 using CommandFunction = Json::Value (*)(CommandCall& call);
 
+/// Who may use a command. One for everyone answers ordinary users with what they may know: see AskerOf.
+enum class Users { kPrivileged, kEveryone };
+
 struct Command {
   const char* name;
   CommandFunction run;
-  bool for_all;  ///< every user may use it; else root and the engine's own user
+  Users users;
 };
 /// A command by its name; null when there is none.
 const Command* FindCommand(const std::string& name);

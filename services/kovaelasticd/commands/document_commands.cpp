@@ -86,10 +86,12 @@ Json::Value OnDocumentChange(CommandCall& call) {
   return {};
 }
 
-constexpr Command kDocumentCommands[] = {
-    {kUpsert, &OnDocumentChange<kUpsert>, false},           {kSet, &OnDocumentChange<kSet>, false},
-    {kMoveFolder, &OnDocumentChange<kMoveFolder>, false},   {kDelete, &OnDocumentChange<kDelete>, false},
-    {kDeleteQuery, &OnDocumentChange<kDeleteQuery>, false}, {"document_get_by_query", &OnGetByQuery, false}};
+constexpr Command kDocumentCommands[] = {{kUpsert, &OnDocumentChange<kUpsert>, Users::kPrivileged},
+                                         {kSet, &OnDocumentChange<kSet>, Users::kPrivileged},
+                                         {kMoveFolder, &OnDocumentChange<kMoveFolder>, Users::kPrivileged},
+                                         {kDelete, &OnDocumentChange<kDelete>, Users::kPrivileged},
+                                         {kDeleteQuery, &OnDocumentChange<kDeleteQuery>, Users::kPrivileged},
+                                         {"document_get_by_query", &OnGetByQuery, Users::kPrivileged}};
 
 }  // namespace
 

@@ -1,14 +1,14 @@
 #include "services/kovaelasticd/commands/engine.h"
 
-#include <unistd.h>
-
 #include <optional>
+#include <thread>
 #include <vector>
 
 #include "common/json_scan.h"
 #include "common/json_util.h"
 #include "common/log.h"
 #include "services/kovaelasticd/commands/members.h"
+#include "services/kovaelasticd/commands/user_error.h"
 
 namespace ferrox::engine {
 
@@ -20,6 +20,7 @@ constexpr size_t kMembersMax = 64;
 constexpr size_t kReplyMaxBytes = 256U << 20;
 /// Of an unknown command's name, what the error repeats.
 constexpr size_t kNameShownBytes = 100;
+constexpr char kNoCompoundText[] = "only root and the owner of the instance may send several commands in one request";
 
 int ReplyCode(const Error& error) {
   // A fault in reading the request that no command named itself.
@@ -39,13 +40,6 @@ const Command& KnownCommand(const Json::Value& part) {
   return *command;
 }
 
-/// @throws Error kEngineNotPermitted. The peer's user is the one that the kernel gives for the socket.
-void RequireRights(const Command& command, const services::Peer& peer) {
-  if (command.for_all || peer.uid == 0 || peer.uid == geteuid()) return;
-  throw Error(Error::kEngineNotPermitted, "user " + std::to_string(peer.uid) + " may not use \"" + command.name +
-                                              "\"; only root and the engine's own user may");
-}
-
 /// A part's "data", an empty object where it has none.
 Json::Value& DataOf(Json::Value& part) {
   Json::Value& data = part["data"];
@@ -55,16 +49,21 @@ Json::Value& DataOf(Json::Value& part) {
 
 /// Runs `run` and turns what it throws into a failure reply.
 template <typename Run>
-Json::Value ReplyOf(Run run) {
+Json::Value ReplyOf(const Caller& caller, Run run) {
   try {
     return run();
   } catch (const Error& error) {
-    return FailureReply(ReplyCode(error), error.what());
+    return FailureReply(ReplyCode(error), caller.privileged ? error.what() : SentenceForUsers(error));
   } catch (const Json::Exception& error) {
     return FailureReply(Error::kEngineBadRequest, std::string("the request cannot be read: ") + error.what());
   } catch (const std::bad_alloc&) {
     return FailureReply(Error::kEngineBusyMemory, "the engine is short of memory; ask again later");
   }
+}
+
+void WaitForStep(std::chrono::steady_clock::time_point began) {
+  const auto steps = (std::chrono::steady_clock::now() - began) / Engine::kStep + 1;
+  std::this_thread::sleep_until(began + steps * Engine::kStep);
 }
 
 bool Failed(const Json::Value& reply) { return !reply["success"].asBool(); }
@@ -107,49 +106,64 @@ Json::Value SuccessReply(Json::Value data) {
   return reply;
 }
 
-Engine::Engine(const std::string& state_folder) : registry_(state_folder) {}
+Engine::Engine(const std::string& state_folder) : registry_(state_folder), instance_owner_(InstanceOwner()) {}
 
 std::string Engine::Handle(const std::string& request, const services::Peer& peer) {
+  const auto began = std::chrono::steady_clock::now();
+  const Caller caller = CallerOf(peer, instance_owner_);
   std::string text;
-  const Json::Value failure = ReplyOf([&] {
-    text = Answer(request, peer);
+  const Json::Value failure = ReplyOf(caller, [&] {
+    text = Answer(request, caller);
     return Json::Value();
   });
   registry_.HealDamaged();
+  if (!caller.privileged) WaitForStep(began);
   return failure.isNull() ? text : toString(failure);
 }
 
+/// @throws Error kEngineNotPermitted.
+void Engine::RequireRights(const Command& command, const Caller& caller) const {
+  if (caller.privileged) return;
+  if (instance_owner_ != 0) {
+    throw UserError(Error::kEngineNotPermitted, "this is an instance of user " + std::to_string(instance_owner_) +
+                                                    " alone, and answers nobody else but root");
+  }
+  if (command.users == Users::kEveryone) return;
+  throw UserError(Error::kEngineNotPermitted, "user " + std::to_string(caller.uid) + " may not use \"" + command.name +
+                                                  "\"; only root and the owner of the instance may");
+}
+
 /// All parts of a compound are checked for shape and rights before the first is carried out.
-std::string Engine::Answer(const std::string& request, const services::Peer& peer) {
+std::string Engine::Answer(const std::string& request, const Caller& caller) {
   const auto members = JsonMembers(request, kMembersMax);
   if (members.has_value() && members->size() == 1 && members->front().name == "\"compound\"") {
-    CompoundParts parts(members->front().value,
-                        [&peer](const Json::Value& part) { RequireRights(KnownCommand(part), peer); });
-    return AnswerCompound(parts);
+    if (!caller.privileged) throw UserError(Error::kEngineNotPermitted, kNoCompoundText);
+    CompoundParts parts(members->front().value, [](const Json::Value& part) { (void)KnownCommand(part); });
+    return AnswerCompound(parts, caller);
   }
   Json::Value parsed = ParseCommand(request);
   if (parsed.isMember("compound")) throw Error(Error::kEngineBadRequest, kShapeText);
   const Command& command = KnownCommand(parsed);
-  RequireRights(command, peer);
-  CommandCall call{registry_, DataOf(parsed)};
+  RequireRights(command, caller);
+  CommandCall call{registry_, caller, DataOf(parsed)};
   return toString(SuccessReply(command.run(call)));
 }
 
 /// The parts in order; neighbours that change documents of one index are carried out in one go.
-std::string Engine::AnswerCompound(CompoundParts& parts) {
+std::string Engine::AnswerCompound(CompoundParts& parts, const Caller& caller) {
   CompoundReply reply;
   bool suggestions_done = false;
   while (!parts.AtEnd()) {
     if (IsDocumentChange(parts.Front()["command"].asString())) {
-      AnswerChanges(parts, reply);
+      AnswerChanges(parts, caller, reply);
       continue;
     }
     Json::Value part = parts.Take();
     const std::string name = part["command"].asString();
     // One rebuilding serves all the documents that are named.
     const bool repeated = name == "update_term_suggestion" && suggestions_done;
-    const Json::Value answer = repeated ? SuccessReply(Json::Value()) : ReplyOf([&] {
-      CommandCall call{registry_, DataOf(part)};
+    const Json::Value answer = repeated ? SuccessReply(Json::Value()) : ReplyOf(caller, [&] {
+      CommandCall call{registry_, caller, DataOf(part)};
       return SuccessReply(FindCommand(name)->run(call));
     });
     suggestions_done = suggestions_done || (name == "update_term_suggestion" && !Failed(answer));
@@ -161,7 +175,7 @@ std::string Engine::AnswerCompound(CompoundParts& parts) {
 /// Carries out the next changes that are for the same index, in one turn of its thread: a compound of ten thousand
 /// documents waits for the thread once. A change that is refused does not keep the others from being made; a failure of
 /// the store ends them all.
-void Engine::AnswerChanges(CompoundParts& compound, CompoundReply& reply) {
+void Engine::AnswerChanges(CompoundParts& compound, const Caller& caller, CompoundReply& reply) {
   const Json::Value id = compound.Front()["data"]["id"];
   std::vector<Json::Value> parts = compound.TakeWhile([&id](const Json::Value& part) {
     return IsDocumentChange(part["command"].asString()) && part["data"]["id"] == id;
@@ -170,7 +184,7 @@ void Engine::AnswerChanges(CompoundParts& compound, CompoundReply& reply) {
   std::vector<Json::Value> failures(parts.size());
   std::shared_ptr<Index> index;
   for (size_t i = 0; i < parts.size(); ++i) {
-    failures[i] = ReplyOf([&] {
+    failures[i] = ReplyOf(caller, [&] {
       Json::Value& data = DataOf(parts[i]);
       const Registry::OpenIndex open = registry_.Open(RequiredText(data, "id"));
       changes[i] = ReadDocumentChange(parts[i]["command"].asString(), open, data);

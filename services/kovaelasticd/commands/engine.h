@@ -1,9 +1,12 @@
 #pragma once
 
+#include <chrono>
+#include <cstdint>
 #include <string>
 
 #include <json/value.h>
 
+#include "services/kovaelasticd/commands/caller.h"
 #include "services/kovaelasticd/commands/commands.h"
 #include "services/kovaelasticd/commands/compound_parts.h"
 #include "services/kovaelasticd/indices/registry.h"
@@ -18,18 +21,23 @@ class CompoundReply;
 /// index, a search for no other request.
 class Engine {
  public:
+  static constexpr std::chrono::milliseconds kStep{5};
+
   /// Loads the indices that are noted in `state_folder`. @throws Error kInternal.
   explicit Engine(const std::string& state_folder);
 
-  /// One request to one reply, whatever the request holds.
+  /// One request to one reply, whatever the request holds. What an ordinary user is told leaves at the next full kStep
+  /// since the call, so that its time tells less of what others have.
   std::string Handle(const std::string& request, const services::Peer& peer);
 
  private:
-  std::string Answer(const std::string& request, const services::Peer& peer);
-  std::string AnswerCompound(CompoundParts& parts);
-  void AnswerChanges(CompoundParts& compound, CompoundReply& reply);
+  std::string Answer(const std::string& request, const Caller& caller);
+  void RequireRights(const Command& command, const Caller& caller) const;
+  std::string AnswerCompound(CompoundParts& parts, const Caller& caller);
+  void AnswerChanges(CompoundParts& compound, const Caller& caller, CompoundReply& reply);
 
   Registry registry_;
+  const uint32_t instance_owner_;
 };
 
 }  // namespace ferrox::engine

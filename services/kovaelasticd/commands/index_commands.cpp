@@ -143,11 +143,11 @@ Json::Value OnIndexStat(CommandCall& call) {
 }
 
 constexpr Command kIndexCommands[] = {
-    {"index_create", &OnIndexCreate, false},   {"index_pause", &OnIndexPause, false},
-    {"index_resume", &OnIndexResume, false},   {"index_delete", &OnIndexDelete, false},
-    {"index_rebuild", &OnIndexRebuild, false}, {"index_rebuilt", &OnIndexRebuilt, false},
-    {"index_share", &OnIndexShare, false},     {"index_config_set", &OnIndexConfigSet, false},
-    {"index_list", &OnIndexList, false},       {"index_stat", &OnIndexStat, false}};
+    {"index_create", &OnIndexCreate, Users::kPrivileged},   {"index_pause", &OnIndexPause, Users::kPrivileged},
+    {"index_resume", &OnIndexResume, Users::kPrivileged},   {"index_delete", &OnIndexDelete, Users::kPrivileged},
+    {"index_rebuild", &OnIndexRebuild, Users::kPrivileged}, {"index_rebuilt", &OnIndexRebuilt, Users::kPrivileged},
+    {"index_share", &OnIndexShare, Users::kPrivileged},     {"index_config_set", &OnIndexConfigSet, Users::kPrivileged},
+    {"index_list", &OnIndexList, Users::kPrivileged},       {"index_stat", &OnIndexStat, Users::kPrivileged}};
 
 }  // namespace
 
