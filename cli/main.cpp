@@ -13,6 +13,7 @@
 #include "common/error.h"
 #include "common/paths.h"
 #include "services/support/daemon.h"
+#include "services/support/instance_owner.h"
 
 #ifndef FERROX_VERSION
 #define FERROX_VERSION "unknown"
@@ -60,6 +61,7 @@ void PrepareInstance(Needs needs) {
   RequireRights(needs);
   if (needs != Needs::kNothing && needs != Needs::kService) RequireShareTable(needs);
   if (needs < Needs::kInstance || ferrox::InstancePath("").empty()) return;
+  ferrox::services::ClosePrivateFolders();
   for (const char* folder : {"/tmp", "/var/run", ferrox::kConfigurationFolder}) {
     const std::string path = ferrox::InstancePath(folder);
     if (!base::MakeFolders(path)) ThrowSystemFailure(errno, "make", path);

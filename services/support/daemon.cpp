@@ -25,6 +25,7 @@
 #include "common/clock.h"
 #include "common/log.h"
 #include "common/paths.h"
+#include "services/support/instance_owner.h"
 
 namespace ferrox::services {
 
@@ -105,6 +106,7 @@ Daemon::Daemon(const std::string& name) : name_(name) {
   openlog(name_.c_str(), LOG_PID | (InstancePath("").empty() ? 0 : LOG_PERROR), LOG_DAEMON);
   const std::string problem = InstanceRootProblem();
   FERROX_FAIL_IF(!problem.empty(), Error::kInternal, problem);
+  ClosePrivateFolders();
   for (const char* folder : {"/var/run", "/tmp", kConfigurationFolder}) {
     FERROX_FAIL_IF(!base::MakeFolders(InstancePath(folder)), Error::kInternal,
                    "cannot make " + InstancePath(folder) + ": " + ErrnoText());

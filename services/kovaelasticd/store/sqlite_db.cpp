@@ -1,5 +1,10 @@
 #include "services/kovaelasticd/store/sqlite_db.h"
 
+#include <fcntl.h>
+#include <sys/stat.h>
+
+#include <string>
+
 #include "common/log.h"
 #include "services/kovaelasticd/store/checksum_vfs.h"
 #include "services/kovaelasticd/store/page_checksums.h"
@@ -7,6 +12,17 @@
 namespace ferrox::engine {
 
 namespace {
+
+/// A database holds the contents of files that not everybody may read, whatever others may do in its folder; the files
+/// that SQLite makes beside it get its mode. Not by a descriptor: closing that would end SQLite's locks on the file.
+void CloseToOthers(const std::string& path) {
+  for (const char* suffix : {"", "-wal", "-shm"}) {
+    const std::string file = path + suffix;
+    struct stat status = {};
+    if (lstat(file.c_str(), &status) != 0 || !S_ISREG(status.st_mode) || (status.st_mode & 077) == 0) continue;
+    (void)fchmodat(AT_FDCWD, file.c_str(), 0600, AT_SYMLINK_NOFOLLOW);
+  }
+}
 
 /// By the primary code, which is the low byte of an extended one, except for a page whose checksum is wrong.
 bool IsDamage(int result) {
@@ -100,6 +116,7 @@ Database::Database(const std::string& path, Mode mode) : path_(path) {
   const int result = sqlite3_open_v2(path.c_str(), &opened, flags, ChecksumVfs());
   handle_.reset(opened);
   Check(result);
+  if (mode != Mode::kRead) CloseToOthers(path);
   int reserved = kChecksumBytes;  // a file that has its first table already keeps what it has
   Check(sqlite3_file_control(opened, nullptr, SQLITE_FCNTL_RESERVE_BYTES, &reserved));
   (void)sqlite3_busy_timeout(opened, kBusyTimeoutMs);
