@@ -1,0 +1,138 @@
+#!/usr/bin/python3
+"""Everyone finds exactly what the kernel lets them open.
+
+Random trees below a share, random users; after every random change of rights, names or files the set that each user finds
+is compared with what open(O_RDONLY) allows a process with that user's ids, from "/" on.
+
+    FERROX_BIN=build/release/bin python3 -B tests/rights/kernel_proof.py --seeds 200
+
+--first N begins with another seed than 1, --changes N makes another number of changes for each seed."""
+
+import functools
+import os
+import stat
+import time
+
+from asking import Child, SharedInstance, arguments, end, opens, to_path
+from live import access
+from rights_world import USERS, World
+
+QUERIES = ("size:>=0", "-absentword", "path", "kind:folder", "everyone")
+USERS_A_CHECK = 4
+
+
+class Proof:
+    def __init__(self, instance, share, outside):
+        self.instance, self.share, self.outside = instance, share, outside
+        self.engine = instance.connect()
+        self.failures, self.checks, self.changes, self.readable, self.documents = [], 0, 0, 0, 0
+        self.asked_themselves = 0
+
+    def run_seed(self, seed, changes):
+        world = World(seed, os.fsencode(self.share), os.fsencode(self.outside))
+        world.make()
+        self.check(world, seed, 0, USERS)
+        for number in range(1, changes + 1):
+            world.change()
+            self.changes += 1
+            self.check(world, seed, number, world.random.sample(USERS, USERS_A_CHECK))
+        self.check(world, seed, changes, USERS)
+        world.clear()
+
+    def check(self, world, seed, number, users):
+        self.instance.sync()
+        entries = world.entries()
+        cases = [(user, world.random.choice(QUERIES), world.random.choice((3, 40, 1000))) for user in users]
+        children = [Child(case[0], functools.partial(self.look, entries, *case[1:])) for case in cases]
+        for case, child in zip(cases, children):
+            user, query, limit = case
+            enters, allowed, themselves = child.result()
+            expected = {path for path in allowed if wanted(query, entries[path])} if enters else None
+            place = f"seed {seed}, after change {number} ({world.log[-1]!r}), {case}"
+            self.compare(seed, place, expected, self.engine.pages("docs", self.query(query), limit, user))
+            if themselves != "closed":
+                self.asked_themselves += 1
+                self.compare(seed, place + ", asked by the user", expected, themselves)
+            self.documents += len(entries)
+            self.readable += len(allowed)
+        self.checks += 1
+
+    def query(self, query):
+        return f'path:"{self.share}"' if query == "path" else query
+
+    def look(self, entries, query, limit):
+        """In a process of the user's: whether the share can be entered, what can be opened, and what the engine finds."""
+        enters = can_enter(self.share)
+        allowed = [path for path, status in entries.items()
+                   if (stat.S_ISREG(status.st_mode) or stat.S_ISDIR(status.st_mode)) and opens(path)]
+        try:
+            engine = self.instance.connect()
+        except PermissionError:
+            return enters, allowed, "closed"
+        return enters, allowed, engine.pages("docs", self.query(query), limit)
+
+    def compare(self, seed, place, expected, found):
+        problems = []
+        if expected is None or found is None:
+            if expected is not found:
+                problems.append(f"can enter the share: {expected is not None}, is told of it: {found is not None}")
+        else:
+            paths, total = found
+            for what, wrong in (("may not be shown", set(paths) - expected), ("is missing", expected - set(paths))):
+                problems += [f"{what}: {path!r}\n{self.way(path)}" for path in sorted(wrong)[:3]]
+            if len(paths) != len(set(paths)) or total != len(expected):
+                problems.append(f"{len(paths)} hits of {len(set(paths))} documents, total {total}, expected {len(expected)}")
+        if problems:
+            self.failures.append(seed)
+            print(place, *problems, sep="\n  ", flush=True)
+
+    def way(self, path):
+        """What disk and index say of a path, and of each folder on the way to it."""
+        known = {to_path(entry["KOVAMDPath"]): entry.get("_KOVAAccess")
+                 for entry in self.instance.entries("docs", self.share, "KOVAMDPath", "_KOVAAccess")}
+        lines, share = [], os.fsencode(self.share)
+        while len(path) >= len(share):
+            on_disk = os.path.lexists(path) and access(path, os.lstat(path))
+            lines.append(f"    disk {on_disk}, index {known.get(path)}: {path!r}")
+            path = os.path.dirname(path)
+        return "\n".join(lines)
+
+
+def wanted(query, status):
+    """What a query is after, of all that can be opened."""
+    if query == "kind:folder":
+        return stat.S_ISDIR(status.st_mode)
+    return query != "everyone" or stat.S_ISREG(status.st_mode)
+
+
+def can_enter(folder):
+    try:
+        os.close(os.open(folder + "/.", os.O_PATH))
+    except OSError:
+        return False
+    return True
+
+
+def main():
+    given = arguments(__doc__, seeds=200, first=1, changes=30)
+    begin, instance = time.monotonic(), SharedInstance()
+    try:
+        share = instance.share("docs")
+        outside = f"{os.path.dirname(share)}/outside"
+        os.makedirs(outside)
+        proof = Proof(instance, share, outside)
+        for seed in range(given.first, given.first + given.seeds):
+            proof.run_seed(seed, given.changes)
+            if len(proof.failures) >= 10:
+                break
+    finally:
+        instance.stop()
+    if proof.failures:
+        print("to repeat: --seeds 1 --first", *sorted(set(proof.failures)))
+    end(f"{given.seeds} seeds, {proof.changes} changes, {proof.checks} checks, {proof.documents} answers about a document, "
+        f"{proof.readable} of them yes, {proof.asked_themselves} also asked by the user; {len(proof.failures)} failures; "
+        f"{time.monotonic() - begin:.0f} s", proof.failures)
+
+
+if __name__ == "__main__":
+    main()
