@@ -17,10 +17,11 @@ using Milliseconds = std::chrono::milliseconds;
   throw Error(Error::kEngineRightsUnknown, "what you may read cannot be checked now: " + reason);
 }
 
+/// Users are told it: of another failure than one that is meant for them, nothing.
 std::string ReasonOf(const Reply& reply) {
   switch (reply.outcome) {
     case Outcome::kRefused:
-      return reply.message;
+      return reply.code == Error::kEngineRightsUnknown ? reply.message : "kova-access cannot tell; its log says why";
     case Outcome::kNotRunning:
       return "kova-access does not run";
     case Outcome::kNotPermitted:

@@ -11,7 +11,7 @@
 /// What a user may open on the disk now, asked of `kova-access` (docs/formats/access.md), which tries it with the ids
 /// of that user. An index may be behind the disk; what is shown to a user is checked here before.
 ///
-/// A user is a uid and all of its groups, in any order; a uid of 0, a uid or gid of 2^32 - 1, and a user without a
+/// A user is a uid and all of its groups, in any order. A uid of 0, a uid or gid of 2^32 - 1, and a user without a
 /// group are refused. Paths are full paths at or below the folder of their share. One with ".." in it, with a link on
 /// its way below the share's folder, or of anything but a regular file or a folder is not readable.
 namespace ferrox::wire {

@@ -100,7 +100,7 @@ void FreeTextMemory(int memory) {
   (void)fallocate(memory, FALLOC_FL_PUNCH_HOLE | FALLOC_FL_KEEP_SIZE, 0, info.st_size);
 }
 
-Extractor::Extractor(const WorkerPool::Options& options, const OpenLimit::Options& limit)
+Extractor::Extractor(const WorkerPool::Options& options, const services::OpenLimit::Options& limit)
     : pool_(options), open_limit_(limit) {
   pool_.Probe(Program::kGeneral);
 }
@@ -148,7 +148,7 @@ Json::Value Extractor::Extract(const std::string& root, const std::string& path,
 
 /// All that is done with the file itself: its file system may not answer for ever.
 Extractor::OpenedFile Extractor::OpenFile(const std::string& root, const std::string& path) {
-  const OpenLimit::Turn turn(open_limit_, root);
+  const services::OpenLimit::Turn turn(open_limit_, root);
   OpenedFile file;
   struct stat info = {};
   file.fd = OpenBeneath(root, path);

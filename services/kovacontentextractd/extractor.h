@@ -8,7 +8,7 @@
 #include <json/value.h>
 
 #include "base/unique_fd.h"
-#include "services/kovacontentextractd/open_limit.h"
+#include "services/support/open_limit.h"
 #include "services/kovacontentextractd/worker_pool.h"
 #include "services/support/frame_server.h"
 
@@ -41,7 +41,7 @@ void FreeTextMemory(int memory);
 /// files within it. Nothing that a worker says goes into the reply unchecked.
 class Extractor {
  public:
-  Extractor(const WorkerPool::Options& options, const OpenLimit::Options& limit);
+  Extractor(const WorkerPool::Options& options, const services::OpenLimit::Options& limit);
 
   /// One request in, its reply out; never throws.
   std::string Handle(const std::string& request, const services::Peer& peer);
@@ -70,7 +70,7 @@ class Extractor {
   size_t AddAttachments(const Answer& answer, Json::Value& document, TextTarget& text);
 
   WorkerPool pool_;
-  OpenLimit open_limit_;
+  services::OpenLimit open_limit_;
 };
 
 }  // namespace ferrox::extract

@@ -56,7 +56,7 @@ extract::WorkerPool::Options PoolOptions() {
 void Serve() {
   services::Daemon daemon("kovacontentextractd");
   const extract::WorkerPool::Options pool_options = PoolOptions();
-  extract::OpenLimit::Options limit;
+  services::OpenLimit::Options limit;
   limit.at_once = pool_options.workers_max + kHeldThreads;
   extract::Extractor extractor(pool_options, limit);
   services::FrameServerOptions options;

@@ -50,10 +50,11 @@ FrameConnection::Progress FrameConnection::Receive(const FrameServerOptions& opt
   }
 }
 
-void FrameConnection::BeginSending(std::string reply) {
-  const auto length = static_cast<uint32_t>(reply.size());
+void FrameConnection::BeginSending(FrameReply reply) {
+  const auto length = static_cast<uint32_t>(reply.body.size());
   memcpy(header_.data(), &length, kHeaderBytes);
-  body = std::move(reply);
+  body = std::move(reply.body);
+  sent_descriptor_ = std::move(reply.descriptor);
   state = State::kSending;
   done_ = 0;
   last_progress = SteadyClock::now();
@@ -65,7 +66,16 @@ void FrameConnection::BeginReceiving() {
   done_ = 0;
 }
 
+/// With the descriptor, of which the peer then has a copy of its own.
+bool FrameConnection::SendHeader() {
+  if (!base::SendWithDescriptors(fd.Get(), {header_.data(), kHeaderBytes}, {sent_descriptor_.Get()})) return false;
+  sent_descriptor_.Reset();
+  done_ = kHeaderBytes;
+  return true;
+}
+
 FrameConnection::Progress FrameConnection::Send() {
+  if (sent_descriptor_.Valid() && !SendHeader()) return errno == EAGAIN ? Progress::kMore : Progress::kBroken;
   while (done_ < kHeaderBytes + body.size()) {
     const size_t of_header = std::min(done_, kHeaderBytes), of_body = done_ - of_header;
     iovec parts[] = {{header_.data() + of_header, kHeaderBytes - of_header},

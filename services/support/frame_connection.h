@@ -27,7 +27,7 @@ struct FrameConnection {
 
   /// Reads what is there, up to the end of the frame. Memory grows with what arrives, not with what is announced.
   Progress Receive(const FrameServerOptions& options, Chunk& chunk);
-  void BeginSending(std::string reply);
+  void BeginSending(FrameReply reply);
   /// Sends as much as the kernel takes.
   Progress Send();
   void BeginReceiving();
@@ -48,8 +48,11 @@ struct FrameConnection {
   std::optional<uint32_t> BodyBytes() const;
   ssize_t ReceiveBytes(Chunk& chunk, size_t size, bool takes_descriptors);
 
+  bool SendHeader();
+
   std::array<char, kHeaderBytes> header_ = {};
-  size_t done_ = 0;  ///< of header and body, received or sent
+  base::UniqueFd sent_descriptor_;  ///< goes with the header of the reply
+  size_t done_ = 0;                 ///< of header and body, received or sent
 };
 
 }  // namespace ferrox::services

@@ -221,8 +221,8 @@ class FrameServer::Impl {
       const uint64_t added = connection.body.size() - before;
       if ((request_bytes_ += added) > options_.requests_limit_bytes || progress == Progress::kBroken) return Next::kEnd;
       if (progress == Progress::kMore) return Next::kReceive;
-      std::string reply = handler_(connection.body, connection.peer);
-      const size_t worked_on = connection.body.size() + reply.size();
+      FrameReply reply = handler_(connection.body, connection.peer);
+      const size_t worked_on = connection.body.size() + reply.body.size();
       request_bytes_ -= connection.body.size();
       connection.BeginSending(std::move(reply));
       if (worked_on > kLargeBytes) (void)malloc_trim(0);  // what it took lies scattered, and the daemon runs for months

@@ -7,6 +7,7 @@
 #include <functional>
 #include <memory>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "base/unique_fd.h"
@@ -21,6 +22,14 @@ struct Peer {
   pid_t pid = 0;
   std::vector<gid_t> groups = {};  ///< the supplementary ones, in the kernel's order; `gid` need not be among them
   int descriptor = -1;  ///< the last that came with its requests, open as long as its connection is; -1: none
+};
+
+/// What a request is answered with, and a descriptor that goes with it (SCM_RIGHTS), none unless it is given.
+struct FrameReply {
+  FrameReply(std::string text, base::UniqueFd passed = {}) : body(std::move(text)), descriptor(std::move(passed)) {}
+
+  std::string body;
+  base::UniqueFd descriptor;
 };
 
 struct FrameServerOptions {
@@ -51,7 +60,7 @@ class FrameServer {
  public:
   /// Answers one request; called on one of the workers, which has just read it. An exception ends that connection
   /// alone.
-  using Handler = std::function<std::string(const std::string& request, const Peer& peer)>;
+  using Handler = std::function<FrameReply(const std::string& request, const Peer& peer)>;
 
   /// Binds and listens. A socket file left by a dead process is replaced; one that answers is not.
   /// @throws Error kInternal, with the path and what to do, when the socket cannot be had.

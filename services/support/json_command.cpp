@@ -23,9 +23,8 @@ Json::Value ErrorReply(int code, const std::string& message) {
 }
 
 /// A request is a JSON text with or without the terminating zero that the library sends.
-Json::Value Dispatch(const std::string& request, const Peer& peer, const JsonCommand& command) {
-  FERROX_FAIL_IF(peer.uid != 0 && peer.uid != geteuid(), Error::kEngineNotPermitted,
-                 "only root and the owner of this instance may steer it");
+Json::Value Dispatch(const std::string& request, bool is_obeyed, const JsonCommand& command) {
+  FERROX_FAIL_IF(!is_obeyed, Error::kEngineNotPermitted, "only root and the owner of this instance may steer it");
   FERROX_FAIL_IF(CountJsonValues(request) > kValuesMax, Error::kBadArgument,
                  "the request has too many values; no command needs more than " + std::to_string(kValuesMax));
   const size_t end = request.find_last_not_of('\0');
@@ -39,10 +38,13 @@ Json::Value Dispatch(const std::string& request, const Peer& peer, const JsonCom
 
 }  // namespace
 
-std::string AnswerJsonCommand(const std::string& request, const Peer& peer, const JsonCommand& command) {
+bool IsRootOrOwner(const Peer& peer) { return peer.uid == 0 || peer.uid == geteuid(); }
+
+std::string AnswerJsonCommand(const std::string& request, const Peer& peer, const JsonCommand& command,
+                              bool (*is_obeyed)(const Peer& peer)) {
   try {
     Json::Value reply;
-    reply["data"] = Dispatch(request, peer, command);
+    reply["data"] = Dispatch(request, is_obeyed(peer), command);
     reply["success"] = true;
     return toString(reply);
   } catch (const Error& error) {

@@ -27,7 +27,7 @@ MAY = {
     "services/support": LIBRARY,
     "cli": LIBRARY + ["services/support"],
 }
-DAEMONS = ("fileindexd", "kovacontentextractd", "kovaelasticd", "kovanotifyd", "supervisor")
+DAEMONS = ("fileindexd", "kova-access", "kovacontentextractd", "kovaelasticd", "kovanotifyd", "supervisor")
 MAY |= {f"services/{name}": LIBRARY + ["services/support"] for name in DAEMONS}
 # The engine's rooms, each of which may include those before it.
 ENGINE = [f"services/kovaelasticd/{name}" for name in ("text", "query", "store", "search", "indices", "commands")]

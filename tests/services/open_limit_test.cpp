@@ -1,5 +1,5 @@
 // Catches folders that do not answer and take all the threads with them.
-#include "services/kovacontentextractd/open_limit.h"
+#include "services/support/open_limit.h"
 
 #include <gtest/gtest.h>
 
@@ -9,7 +9,7 @@
 namespace ferrox::test {
 namespace {
 
-using extract::OpenLimit;
+using services::OpenLimit;
 
 std::string Refusal(OpenLimit& limit, const std::string& root) try {
   const OpenLimit::Turn turn(limit, root);
@@ -39,6 +39,10 @@ TEST(OpenLimitTest, ThereAreNeverMoreThanSoMany) {
   const OpenLimit::Turn second(limit, "/b");
   EXPECT_NE("", Refusal(limit, "/c"));
   EXPECT_EQ("[]", toString(limit.Held())) << "none has taken long";
+  OpenLimit of_each({3, 2, std::chrono::hours(1), 1});
+  const OpenLimit::Turn only(of_each, "/a");
+  EXPECT_NE("", Refusal(of_each, "/a"));
+  EXPECT_EQ("", Refusal(of_each, "/b"));
 }
 
 }  // namespace

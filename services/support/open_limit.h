@@ -1,6 +1,7 @@
 #pragma once
 
 #include <chrono>
+#include <climits>
 #include <list>
 #include <string>
 
@@ -8,7 +9,7 @@
 
 #include "base/mutex.h"
 
-namespace ferrox::extract {
+namespace ferrox::services {
 
 /// Bounds how many threads hang in file systems that do not answer, such as a network file system whose server is away.
 /// A thread in open(2) or in a first read there cannot be interrupted; without a bound, a few requests for files of one
@@ -27,6 +28,7 @@ class OpenLimit {
     unsigned at_once = 16;  ///< openings in all
     unsigned held_max = 2;  ///< openings below one root that last long; with so many, no further one begins there
     std::chrono::milliseconds long_time = std::chrono::seconds(5);
+    unsigned root_at_once = UINT_MAX;  ///< openings below one root, however long they last
   };
   explicit OpenLimit(const Options& options) : options_(options) {}
 
@@ -57,4 +59,4 @@ class OpenLimit {
   std::list<Opening> openings_ BASE_GUARDED_BY(mutex_);  ///< the longest under way first
 };
 
-}  // namespace ferrox::extract
+}  // namespace ferrox::services

@@ -1,4 +1,4 @@
-#include "services/kovacontentextractd/open_limit.h"
+#include "services/support/open_limit.h"
 
 #include <algorithm>
 #include <set>
@@ -6,7 +6,7 @@
 #include "common/error.h"
 #include "common/log.h"
 
-namespace ferrox::extract {
+namespace ferrox::services {
 
 std::list<OpenLimit::Opening>::iterator OpenLimit::Begin(const std::string& root) {
   const auto now = std::chrono::steady_clock::now();
@@ -16,8 +16,10 @@ std::list<OpenLimit::Opening>::iterator OpenLimit::Begin(const std::string& root
   });
   FERROX_FAIL_IF(held >= static_cast<int64_t>(options_.held_max), Error::kInternal,
                  "the file system of " + root + " does not answer");
-  FERROX_FAIL_IF(openings_.size() >= options_.at_once, Error::kInternal,
-                 "too many files are being opened; does a file system not answer?");
+  const auto at_root =
+      std::count_if(openings_.begin(), openings_.end(), [&](const Opening& one) { return one.root == root; });
+  const bool full = openings_.size() >= options_.at_once || at_root >= static_cast<int64_t>(options_.root_at_once);
+  FERROX_FAIL_IF(full, Error::kInternal, "too many files are being opened; does a file system not answer?");
   return openings_.insert(openings_.end(), {root, now});
 }
 
@@ -40,4 +42,4 @@ Json::Value OpenLimit::Held() const {
   return held;
 }
 
-}  // namespace ferrox::extract
+}  // namespace ferrox::services

@@ -1,0 +1,63 @@
+#include "services/kova-access/access_server.h"
+
+#include <unistd.h>
+
+#include <utility>
+
+#include "services/support/json_command.h"
+
+namespace ferrox::access {
+
+namespace {
+
+/// Who may ask what others may open: whom the engine runs as.
+bool MayAsk(const services::Peer& peer) { return services::IsRootOrOwner(peer); }
+
+/// Of a file that the user may not open, nothing is told.
+Json::Value JsonOf(const wire::LiveFile& file) {
+  Json::Value json(Json::objectValue);
+  if (file.readable) json["readable"] = true;
+  if (file.entered) json["entered"] = true;
+  if (file.stamp.empty()) return json;
+  if (file.folder) json["folder"] = true;
+  json["stamp"] = file.stamp;
+  return json;
+}
+
+Json::Value LookAt(const LiveShare& share, const std::vector<std::string>& paths) {
+  Json::Value files(Json::arrayValue);
+  for (const std::string& path : paths) files.append(JsonOf(share.Look(path)));
+  return files;
+}
+
+}  // namespace
+
+services::FrameReply AccessServer::Handle(const std::string& request, const services::Peer& peer) {
+  base::UniqueFd descriptor;
+  const auto answer = [&](const std::string& type, const Json::Value& data) {
+    return Answer(ReadRequest(type, data), descriptor);
+  };
+  std::string reply = services::AnswerJsonCommand(request, peer, answer, &MayAsk);
+  return {std::move(reply), std::move(descriptor)};
+}
+
+Json::Value AccessServer::Answer(const Request& request, base::UniqueFd& descriptor) {
+  Json::Value data(Json::objectValue);
+  if (request.kind == Request::Kind::kStatus) {
+    data["pid"] = getpid();
+    data["unresponsive"] = limit_.Held();
+    return data;
+  }
+  const services::OpenLimit::Turn turn(limit_, request.root);
+  RunAsUser(request.user, [&] {
+    const LiveShare share(own_descriptors_, request.root);
+    if (request.kind == Request::Kind::kOpen) {
+      descriptor = share.Open(request.paths.front());
+    } else {
+      data["files"] = LookAt(share, request.paths);
+    }
+  });
+  return data;
+}
+
+}  // namespace ferrox::access
