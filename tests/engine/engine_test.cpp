@@ -172,12 +172,13 @@ TEST_F(EngineTest, RightsAreSetForAllRecordsOrNone) {
   }
   const std::string good = record("/v/x", "1.1.5000000000.7", "1000:100:0640:u5001=4,g=4,g200=6");
   for (const std::string& bad :
-       {record("v/y", "1.1.2.7", "0:0:0644"), record("/v/y", "1.1.7", "0:0:0644"), record("/v/y", "1.1.2.7", ""),
-        record("/v/y", "1.1.2.7", "0:0:644"), record("/v/y", "1.1.2.7", "00:0:0644"),
-        record("/v/y", "1.1.2.7", "0:0:10644"), record("/v/y", "1.1.2.7", "0:0:0644:"),
-        record("/v/y", "1.1.2.7", "0:0:0644:u5=4"), record("/v/y", "1.1.2.7", "0:0:0644:g5=4,g=4"),
-        record("/v/y", "1.1.2.7", "0:0:0644:g=8"), record("/v/y", "1.1.2.7", "4294967296:0:0644"),
-        std::string(R"({"path":"/v/y","stamp":"1.1.2.7"})"), std::string("1")}) {
+       {record("v/y", "1.1.2.7", "0:0:0644"), record("/v/y", "1.1.7", "0:0:0644"),
+        record("/v/y", "1.1.2.7x", "0:0:0644"), record("/v/y", "1.1.2.7", ""), record("/v/y", "1.1.2.7", "0:0:644"),
+        record("/v/y", "1.1.2.7", "00:0:0644"), record("/v/y", "1.1.2.7", "0:0:10644"),
+        record("/v/y", "1.1.2.7", "0:0:0644:"), record("/v/y", "1.1.2.7", "0:0:0644:u5=4"),
+        record("/v/y", "1.1.2.7", "0:0:0644:g5=4,g=4"), record("/v/y", "1.1.2.7", "0:0:0644:g=8"),
+        record("/v/y", "1.1.2.7", "4294967296:0:0644"), std::string(R"({"path":"/v/y","stamp":"1.1.2.7"})"),
+        std::string("1")}) {
     const Json::Value reply = set("[" + good + "," + bad + "]");
     EXPECT_EQ(Error::kEngineBadRequest, CodeOf(reply)) << bad;
     EXPECT_NE(reply["error"]["msg"].asString().find("position 1: "), std::string::npos) << toString(reply);

@@ -8,9 +8,9 @@
 #include <cstring>
 #include <stdexcept>
 
+#include "base/file_stamp.h"
 #include "base/text.h"
 #include "platform/host/content/access_record.h"
-#include "platform/shared/stamp.h"
 #include "wire/fields.h"
 
 namespace kova::content {
@@ -33,8 +33,10 @@ Rights RightsOf(const struct statx& info) {
 }
 
 std::string Stamp(const struct statx& info) {
-  return StampText(info.stx_size, Nanoseconds(info.stx_mtime.tv_sec, info.stx_mtime.tv_nsec),
-                   Nanoseconds(info.stx_ctime.tv_sec, info.stx_ctime.tv_nsec), info.stx_ino);
+  using base::FileStamp;
+  return FileStamp{info.stx_size, FileStamp::Nanoseconds(info.stx_mtime.tv_sec, info.stx_mtime.tv_nsec),
+                   FileStamp::Nanoseconds(info.stx_ctime.tv_sec, info.stx_ctime.tv_nsec), info.stx_ino}
+      .Text();
 }
 
 void AddSizesAndDates(const struct statx& info, Json::Value& document) {

@@ -10,11 +10,11 @@
 #include <kova/content_extract.h>
 #include <kova/content_type.h>
 
+#include "base/file_stamp.h"
 #include "platform/host/content/access_record.h"
 #include "platform/host/content/extract_client.h"
 #include "platform/host/content/facts.h"
 #include "platform/host/content/programs.h"
-#include "platform/shared/stamp.h"
 #include "wire/fields.h"
 
 namespace kova::content {
@@ -73,8 +73,9 @@ void MarkUnsettled(const Facts& facts, Json::Value& document) {
   document[field::k_KOVANeedMeta] = true;
   document[field::k_KOVAExtractVersion] = 0;
   document[field::k_KOVAExtractError] = "its rights kept changing while it was read";
-  const int64_t changed = Nanoseconds(facts.info.stx_ctime.tv_sec, facts.info.stx_ctime.tv_nsec);
-  document[field::k_KOVAStamp] = StampText(0, 0, changed, facts.info.stx_ino);
+  using base::FileStamp;
+  const int64_t changed = FileStamp::Nanoseconds(facts.info.stx_ctime.tv_sec, facts.info.stx_ctime.tv_nsec);
+  document[field::k_KOVAStamp] = FileStamp{0, 0, changed, facts.info.stx_ino}.Text();
 }
 
 }  // namespace

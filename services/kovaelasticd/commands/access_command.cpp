@@ -1,8 +1,8 @@
+#include "base/file_stamp.h"
 #include "common/log.h"
 #include "services/kovaelasticd/commands/commands.h"
 #include "services/kovaelasticd/commands/members.h"
 #include "services/kovaelasticd/store/access_records.h"
-#include "services/kovaelasticd/store/file_stamp.h"
 
 namespace ferrox::engine {
 
@@ -13,7 +13,8 @@ constexpr size_t kRecordsMax = 10000;
 AccessChange ReadRecord(const Json::Value& record) {
   AccessChange change{CheckedPath("path", RequiredText(record, "path")), RequiredText(record, "stamp"),
                       RequiredText(record, "access")};
-  if (!FileStamp::Parse(change.stamp).has_value()) RefuseMember("stamp", "a text like 5.1718000000.1718000000.77");
+  if (!base::FileStamp::Parse(change.stamp).has_value())
+    RefuseMember("stamp", "a text like 5.1718000000.1718000000.77");
   return change;
 }
 

@@ -1,5 +1,5 @@
 // What changes the access records of a SqliteStore's documents and folders.
-#include "services/kovaelasticd/store/file_stamp.h"
+#include "base/file_stamp.h"
 #include "services/kovaelasticd/store/packed_fields.h"
 #include "services/kovaelasticd/store/sqlite_store.h"
 
@@ -37,8 +37,8 @@ class SqliteStore::AccessPass {
       catalogue_.GiveFolder(change.path, access_);
       return Found::kMissing;
     }
-    const auto stored = FileStamp::Parse(TextField(row.packed, stamp_field_).value_or(""));
-    const auto seen = FileStamp::Parse(change.stamp);
+    const auto stored = base::FileStamp::Parse(TextField(row.packed, stamp_field_).value_or(""));
+    const auto seen = base::FileStamp::Parse(change.stamp);
     const bool same = stored.has_value() && seen.has_value() && stored->SameContent(*seen);
     if (!same) {
       Write(row, row.packed, change);
@@ -90,7 +90,7 @@ class SqliteStore::AccessPass {
            TextField(row.packed, group_field_) != group_;
   }
 
-  Json::Value Members(const AccessChange& change, const FileStamp& seen) const {
+  Json::Value Members(const AccessChange& change, const base::FileStamp& seen) const {
     Json::Value members;
     members[FileLinks::kStamp] = change.stamp;
     members[field::kAccess] = change.access;

@@ -1,9 +1,9 @@
 #include "services/kovaelasticd/store/file_links.h"
 
-#include <charconv>
 #include <optional>
 #include <vector>
 
+#include "base/file_stamp.h"
 #include "services/kovaelasticd/store/packed_fields.h"
 #include "services/kovaelasticd/store/store_rows.h"
 
@@ -12,12 +12,7 @@ namespace ferrox::engine {
 namespace {
 
 /// 0: not known.
-int64_t FileOf(const std::string& stamp) {
-  const size_t dot = stamp.rfind('.');
-  uint64_t file = 0;
-  if (dot != std::string::npos) (void)std::from_chars(stamp.data() + dot + 1, stamp.data() + stamp.size(), file);
-  return static_cast<int64_t>(file);
-}
+int64_t FileOf(const std::string& stamp) { return static_cast<int64_t>(base::FileNumber(stamp)); }
 
 }  // namespace
 
