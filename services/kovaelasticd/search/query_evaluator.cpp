@@ -50,7 +50,7 @@ void AppendOr(std::string& expression, const std::string& alternative) {
 DocSet QueryEvaluator::Evaluate(const QueryNode& node, bool ranking) {
   switch (node.type) {
     case QueryNode::Type::kAll:
-      return AllDocuments();
+      return visible_.All();
     case QueryNode::Type::kAnd:
       return EvaluateAll(node, ranking);
     case QueryNode::Type::kOr: {
@@ -59,7 +59,7 @@ DocSet QueryEvaluator::Evaluate(const QueryNode& node, bool ranking) {
       return found;
     }
     case QueryNode::Type::kNot: {
-      DocSet found = AllDocuments();
+      DocSet found = visible_.All();
       found.Subtract(Evaluate(node.children.front(), false));
       return found;
     }
@@ -95,7 +95,7 @@ DocSet QueryEvaluator::EvaluateAll(const QueryNode& node, bool ranking) {
       intersect(child);
     }
   }
-  if (!any) found = AllDocuments();
+  if (!any) found = visible_.All();
   for (const QueryNode& child : node.children) {
     if (child.type != QueryNode::Type::kNot) continue;
     const QueryNode& excluded = child.children.front();
@@ -105,14 +105,6 @@ DocSet QueryEvaluator::EvaluateAll(const QueryNode& node, bool ranking) {
       found.Subtract(Evaluate(excluded, false));
     }
   }
-  return found;
-}
-
-DocSet QueryEvaluator::AllDocuments() {
-  DocSet found;
-  Statement statement = database_.Prepare("SELECT id FROM docs");
-  while (statement.Step()) found.Add(statement.Int(0));
-  if (hidden_ != nullptr) found.Subtract(*hidden_);
   return found;
 }
 
@@ -133,7 +125,7 @@ DocSet QueryEvaluator::EvaluateFilter(const QueryNode& node) {
     statement.Bind(1, int64_t{KindOfExtension(node.text)}).Bind(2, int64_t{kFolder});
     collect(statement.Bind(3, std::string_view(node.text)));
   } else if (node.type == QueryNode::Type::kPath) {
-    found = PathCondition(reader_, totals_.version, node.text).AllDocuments();
+    found = PathCondition(reader_, visible_.Version(), node.text).AllDocuments();
   } else if (node.type == QueryNode::Type::kRange) {
     Statement statement = database.Prepare("SELECT doc FROM temp.meta_terms WHERE term >= ?1 AND term <= ?2");
     for (const std::string& name : node.fields) {
@@ -147,7 +139,7 @@ DocSet QueryEvaluator::EvaluateFilter(const QueryNode& node) {
                                                              : "SELECT id FROM docs WHERE mtime BETWEEN ?1 AND ?2");
     collect(statement.Bind(1, node.low).Bind(2, node.high));
   }
-  if (hidden_ != nullptr) found.Subtract(*hidden_);
+  visible_.Trim(found);
   return found;
 }
 
@@ -155,7 +147,7 @@ DocSet QueryEvaluator::EvaluateFilter(const QueryNode& node) {
 /// their rows; for many, the set of all that match is cheaper. A range has no column: its words are in meta_fts.
 void QueryEvaluator::ApplyFilter(DocSet& documents, const QueryNode& filter, bool wanted) {
   if (filter.type == QueryNode::Type::kPath) {
-    return PathCondition(reader_, totals_.version, filter.text).Apply(documents, wanted);
+    return PathCondition(reader_, visible_.Version(), filter.text).Apply(documents, wanted);
   }
   if (documents.Count() > kCheckOneByOneMax || filter.type == QueryNode::Type::kRange) {
     const DocSet matching = EvaluateFilter(filter);
@@ -215,14 +207,14 @@ void QueryEvaluator::CollectWords(const QueryNode& node, HitCollector& content, 
 
 /// The documents with these words; with `ranking` also their hits, what they weigh, and what snippets mark.
 DocSet QueryEvaluator::EvaluateWords(const QueryNode& node, bool ranking) {
-  HitCollector content(hits_max_, hidden_);
-  HitCollector meta(hits_max_, hidden_);
+  HitCollector content(hits_max_, visible_);
+  HitCollector meta(hits_max_, visible_);
   CollectWords(node, content, meta);
   DocSet found = content.TakeSet();
   found.UniteWith(meta.Set());
   if (ranking) {
     RankedWord term;
-    term.weight = std::log(1.0 + static_cast<double>(totals_.documents) / static_cast<double>(1 + found.Count()));
+    term.weight = std::log(1.0 + static_cast<double>(visible_.Documents()) / static_cast<double>(1 + found.Count()));
     term.content = content.TakeHits();
     term.meta = meta.TakeHits();
     found_words_.ranked.push_back(std::move(term));

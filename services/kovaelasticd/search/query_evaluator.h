@@ -8,7 +8,7 @@
 #include "services/kovaelasticd/store/doc_set.h"
 #include "services/kovaelasticd/store/fts.h"
 #include "services/kovaelasticd/store/store_reader.h"
-#include "services/kovaelasticd/store/store_rows.h"
+#include "services/kovaelasticd/store/visible.h"
 #include "services/kovaelasticd/text/snippet.h"
 
 namespace ferrox::engine {
@@ -31,14 +31,10 @@ struct FoundWords {
 /// that conditions are joined by bit operations. For one query and one snapshot.
 class QueryEvaluator {
  public:
-  /// `totals` are the snapshot's. `hits_max`: of how many documents, those added last, each word's hits are kept for
-  /// ranking; the sets are complete in any case. What the reader hides is never found.
-  QueryEvaluator(StoreReader& reader, const Totals& totals, size_t hits_max)
-      : reader_(reader),
-        database_(reader.database),
-        totals_(totals),
-        hits_max_(hits_max),
-        hidden_(reader.hidden.get()) {}
+  /// `hits_max`: of how many documents each word's hits are kept for ranking (HitCollector); the sets are complete in
+  /// any case. Nothing that is not `visible` is found, or counts. Both must outlive this.
+  QueryEvaluator(StoreReader& reader, const Visible& visible, size_t hits_max)
+      : reader_(reader), database_(reader.database), visible_(visible), hits_max_(hits_max) {}
 
   /// @throws Error kEngineStorage.
   DocSet Evaluate(const QueryNode& query) { return Evaluate(query, true); }
@@ -51,16 +47,14 @@ class QueryEvaluator {
   DocSet EvaluateAll(const QueryNode& node, bool ranking);
   DocSet EvaluateWords(const QueryNode& node, bool ranking);
   DocSet EvaluateFilter(const QueryNode& node);
-  DocSet AllDocuments();
   void ApplyFilter(DocSet& documents, const QueryNode& filter, bool wanted);
   bool MatchesFilter(int64_t id, const QueryNode& filter);
   void CollectWords(const QueryNode& node, HitCollector& content, HitCollector& meta);
 
   StoreReader& reader_;
   Database& database_;
-  const Totals totals_;
+  const Visible& visible_;
   const size_t hits_max_;
-  const DocSet* const hidden_;
   FoundWords found_words_;
 };
 

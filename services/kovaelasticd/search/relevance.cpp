@@ -37,8 +37,19 @@ double CountValue(uint8_t count, double length_factor) { return count * 2.2 / (c
 
 }  // namespace
 
-/// The documents to rank: all; or, with more than ranked_max_ of them, those added last and all that have a word in
-/// their name, title or fields. `bounded` becomes whether some were left out.
+RelevanceRanking::RelevanceRanking(StoreReader& reader, const Visible& visible, const std::vector<RankedWord>& words,
+                                   size_t ranked_max)
+    : database_(reader.database),
+      visible_(visible),
+      ties_(reader, visible),
+      words_(words),
+      average_text_(std::max(
+          1.0, static_cast<double>(visible.TextBytes()) / std::max(1.0, static_cast<double>(visible.WithContent())))),
+      ranked_max_(ranked_max) {}
+
+/// The documents to rank: all; or, with more than ranked_max_ of them, those added last (for an asker those with the
+/// least PathKeys) and all that have a word in their name, title or fields. `bounded` becomes whether some were left
+/// out.
 std::vector<RelevanceRanking::Candidate> RelevanceRanking::Candidates(const DocSet& documents, int64_t total,
                                                                       bool& bounded) const {
   std::vector<Candidate> candidates;
@@ -51,9 +62,17 @@ std::vector<RelevanceRanking::Candidate> RelevanceRanking::Candidates(const DocS
       for (const WordHit& hit : word.meta) by_name.Add(hit.id);
     }
   }
+  const bool by_key = bounded && visible_.IsForAsker();
+  LeastKeys keys(ranked_max_);
+  documents.ForEach([&](int64_t id) {
+    if (by_key) keys.Add(visible_.PathKey(id));
+    return by_key;
+  });
+  const uint64_t bound = keys.Bound();
   int64_t place = 0;
   documents.ForEach([&](int64_t id) {
-    if (place++ >= skip || by_name.Contains(id)) candidates.push_back({id, 0, 0});
+    const bool is_among = by_key ? visible_.PathKey(id) <= bound : place++ >= skip;
+    if (is_among || by_name.Contains(id)) candidates.push_back({id, 0, 0});
     return true;
   });
   return candidates;
@@ -104,13 +123,23 @@ void RelevanceRanking::ScoreQuickly(std::vector<Candidate>& candidates, std::vec
   }
 }
 
+/// PathKeys of the candidates where these decide, else none.
+std::vector<uint64_t> RelevanceRanking::Keys(const std::vector<Candidate>& candidates) const {
+  std::vector<uint64_t> keys;
+  if (!visible_.IsForAsker() || candidates.size() <= kCloseBlock) return keys;
+  keys.reserve(candidates.size());
+  for (const Candidate& candidate : candidates) keys.push_back(visible_.PathKey(candidate.id));
+  return keys;
+}
+
 /// The places of the candidates that stand from `begin` to `end` in the order of the quick score, in no order.
-std::vector<size_t> RelevanceRanking::PlacesBetween(const std::vector<Candidate>& candidates, size_t begin,
-                                                    size_t end) {
+std::vector<size_t> RelevanceRanking::PlacesBetween(const std::vector<Candidate>& candidates,
+                                                    const std::vector<uint64_t>& keys, size_t begin, size_t end) {
   std::vector<size_t> places(candidates.size());
   std::iota(places.begin(), places.end(), size_t{0});
   const auto better = [&](size_t a, size_t b) {
-    return candidates[a].score != candidates[b].score ? candidates[a].score > candidates[b].score : a > b;
+    if (candidates[a].score != candidates[b].score) return candidates[a].score > candidates[b].score;
+    return keys.empty() ? a > b : ties_.KeyComesFirst(candidates[a].id, keys[a], candidates[b].id, keys[b]);
   };
   const auto first = places.begin() + static_cast<ptrdiff_t>(begin);
   const auto last = places.begin() + static_cast<ptrdiff_t>(end);
@@ -130,20 +159,27 @@ double RelevanceRanking::CloseScore(const Candidate& candidate, const uint8_t* c
   return score;
 }
 
-/// The block of candidates from `begin` to `end` in the order of the quick score, sorted by the close one.
+/// The block of candidates at these places, sorted by the close score; only what stands from `begin` to `end` in it is
+/// wanted.
 std::vector<RankedDocument> RelevanceRanking::RankBlock(const std::vector<Candidate>& candidates,
-                                                        const std::vector<uint8_t>& counts, size_t begin, size_t end) {
+                                                        const std::vector<uint8_t>& counts,
+                                                        const std::vector<size_t>& places, size_t begin, size_t end) {
   std::vector<RankedDocument> ranked;
-  ranked.reserve(end - begin);
-  for (const size_t place : PlacesBetween(candidates, begin, end)) {
+  ranked.reserve(places.size());
+  for (const size_t place : places) {
     RankedDocument entry(candidates[place].id);
     entry.score = CloseScore(candidates[place], counts.data() + place * words_.size());
     ranked.push_back(std::move(entry));
   }
-  std::sort(ranked.begin(), ranked.end(), [](const RankedDocument& a, const RankedDocument& b) {
-    return a.score != b.score ? a.score > b.score : a.id > b.id;
-  });
-  return ranked;
+  const auto better = [](const RankedDocument& a, const RankedDocument& b) { return a.score > b.score; };
+  std::sort(ranked.begin(), ranked.end(), better);
+  const auto wanted = ranked.begin() + static_cast<ptrdiff_t>(end);
+  for (auto equal = ranked.begin() + static_cast<ptrdiff_t>(begin); equal < wanted;) {
+    const auto [first, last] = std::equal_range(ranked.begin(), ranked.end(), *equal, better);
+    ties_.Sort(first, last);
+    equal = last;
+  }
+  return {std::make_move_iterator(ranked.begin() + static_cast<ptrdiff_t>(begin)), std::make_move_iterator(wanted)};
 }
 
 /// The page itself: of all candidates, best first, those from `offset` on; the other way round, counted from the end.
@@ -152,17 +188,17 @@ std::vector<RankedDocument> RelevanceRanking::Page(const DocSet& documents, int6
   std::vector<Candidate> candidates = Candidates(documents, total, bounded);
   std::vector<uint8_t> counts;
   ScoreQuickly(candidates, counts);
+  const std::vector<uint64_t> keys = Keys(candidates);
   const size_t count = candidates.size();
   size_t begin = std::min(count, order.begin);
   size_t end = std::min(count, order.end);
   if (order.ascending) std::tie(begin, end) = std::make_pair(count - end, count - begin);
   std::vector<RankedDocument> page;
   for (size_t block = begin / kCloseBlock * kCloseBlock; block < end; block += kCloseBlock) {
-    std::vector<RankedDocument> ranked = RankBlock(candidates, counts, block, std::min(count, block + kCloseBlock));
-    const size_t first = std::max(begin, block) - block;
-    ranked.resize(std::min(ranked.size(), end - block), RankedDocument(0));
-    page.insert(page.end(), std::make_move_iterator(ranked.begin() + static_cast<ptrdiff_t>(first)),
-                std::make_move_iterator(ranked.end()));
+    const std::vector<size_t> places = PlacesBetween(candidates, keys, block, std::min(count, block + kCloseBlock));
+    std::vector<RankedDocument> ranked =
+        RankBlock(candidates, counts, places, std::max(begin, block) - block, std::min(places.size(), end - block));
+    page.insert(page.end(), std::make_move_iterator(ranked.begin()), std::make_move_iterator(ranked.end()));
   }
   if (order.ascending) std::reverse(page.begin(), page.end());
   return page;

@@ -9,31 +9,27 @@
 #include "services/kovaelasticd/store/doc_set.h"
 #include "services/kovaelasticd/store/index_store.h"
 #include "services/kovaelasticd/store/store_reader.h"
-#include "services/kovaelasticd/store/store_rows.h"
+#include "services/kovaelasticd/store/visible.h"
 
 namespace ferrox::engine {
 
 /// One search over one snapshot of an index: finds the set of documents (QueryEvaluator), orders them by relevance
-/// (RelevanceRanking) or by a column, and loads the page that is asked for. `reader` has a transaction open for as
-/// long, which is what makes it one snapshot.
+/// (RelevanceRanking) or by a column (ColumnOrder), and loads the page that is asked for. `reader` has a transaction
+/// open for as long, which is what makes it one snapshot.
 class Searcher {
  public:
-  Searcher(StoreReader& reader, const SearchRequest& request) : reader_(reader), request_(request) {}
+  Searcher(StoreReader& reader, const SearchRequest& request)
+      : reader_(reader), request_(request), visible_(reader, request.asker) {}
   /// @throws Error kEngineStorage.
   SearchReply Run();
 
  private:
-  std::vector<RankedDocument> OrderByRelevance(const DocSet& documents, const Totals& totals, const FoundWords& words,
-                                               SearchReply& reply);
-  std::vector<RankedDocument> OrderByColumn(const DocSet& documents, int64_t total);
-  std::vector<RankedDocument> OrderFetched(const DocSet& documents);
-  std::vector<RankedDocument> OrderByWalk(const DocSet& documents);
-  /// How many hits, from the first, the page needs to be in order.
-  size_t Needed() const { return static_cast<size_t>(request_.offset + request_.limit); }
+  std::vector<RankedDocument> OrderByRelevance(const DocSet& documents, const FoundWords& words, SearchReply& reply);
   SearchHit LoadHit(const RankedDocument& ranked, const FoundWords& words);
 
   StoreReader& reader_;
   const SearchRequest& request_;
+  const Visible visible_;
 };
 
 /// The search with a connection of `readers`. @throws Error kEngineStorage, IndexDamaged.

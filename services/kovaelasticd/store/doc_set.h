@@ -20,6 +20,11 @@ class DocSet {
     const auto word = static_cast<size_t>(id) >> 6;
     if (word < words_.size()) words_[word] &= ~(uint64_t{1} << (id & 63));
   }
+  /// Says of the 64 numbers from 64 * `word` on whether they are in the set, the first by the lowest bit.
+  void PutWord(size_t word, uint64_t bits) {
+    if (word >= words_.size()) words_.resize(word + word / 2 + 16);
+    words_[word] = bits;
+  }
   bool Contains(int64_t id) const {
     const auto word = static_cast<size_t>(id) >> 6;
     return word < words_.size() && (words_[word] >> (id & 63) & 1) != 0;

@@ -168,14 +168,26 @@ fts5_api* FullTextApi(Database& database) {
 
 }  // namespace
 
-void HitCollector::Add(int64_t id, uint8_t count, uint8_t places) {
-  if (hidden_ != nullptr && hidden_->Contains(id)) return;
-  set_.Add(id);
-  if (hits_.size() >= 2 * hits_max_) hits_.erase(hits_.begin(), hits_.end() - static_cast<ptrdiff_t>(hits_max_));
-  hits_.push_back({static_cast<uint32_t>(id), count, places});
+/// What is kept for an asker at the end does not depend on when this was called, nor on the order of the hits.
+void HitCollector::Shorten() {
+  if (hits_.size() <= hits_max_ || hits_max_ == 0) return;
+  if (!visible_.IsForAsker()) {
+    hits_.erase(hits_.begin(), hits_.end() - static_cast<ptrdiff_t>(hits_max_));
+    return;
+  }
+  std::vector<uint64_t> keys;
+  keys.reserve(hits_.size());
+  for (const WordHit& hit : hits_) keys.push_back(visible_.PathKey(hit.id));
+  const auto last = keys.begin() + static_cast<ptrdiff_t>(hits_max_) - 1;
+  std::nth_element(keys.begin(), last, keys.end());
+  std::erase_if(hits_, [this, bound = *last](const WordHit& hit) { return visible_.PathKey(hit.id) > bound; });
+  shorten_at_ = 2 * hits_.size();
 }
 
-std::vector<WordHit> HitCollector::TakeHits() { return std::move(hits_); }
+std::vector<WordHit> HitCollector::TakeHits() {
+  if (visible_.IsForAsker()) Shorten();
+  return std::move(hits_);
+}
 
 void RegisterFullText(Database& database) {
   fts5_api* api = FullTextApi(database);

@@ -6,6 +6,7 @@
 
 #include "services/kovaelasticd/store/doc_set.h"
 #include "services/kovaelasticd/store/sqlite_db.h"
+#include "services/kovaelasticd/store/visible.h"
 
 namespace ferrox::engine {
 
@@ -23,22 +24,31 @@ struct WordHit {
 };
 constexpr uint8_t kCountMax = 32;
 
-/// Collects the documents that a full-text expression finds: all of them in a set, and the `hits_max` added to the
-/// index last one by one, with their counts.
+/// Collects the visible documents that a full-text expression finds: all of them in a set, and about `hits_max` of them
+/// one by one, with their counts: those added to the index last; for an asker those with the least PathKeys.
 class HitCollector {
  public:
-  /// `hidden`, which may be null, are documents to pass over.
-  explicit HitCollector(size_t hits_max, const DocSet* hidden = nullptr) : hits_max_(hits_max), hidden_(hidden) {}
+  /// `visible` must outlive this.
+  HitCollector(size_t hits_max, const Visible& visible)
+      : hits_max_(hits_max), shorten_at_(2 * hits_max), visible_(visible) {}
   /// Documents come in ascending order, phrase by phrase.
-  void Add(int64_t id, uint8_t count, uint8_t places);
+  void Add(int64_t id, uint8_t count, uint8_t places) {
+    if (!visible_.Contains(id)) return;
+    set_.Add(id);
+    if (hits_.size() >= shorten_at_) Shorten();
+    hits_.push_back({static_cast<uint32_t>(id), count, places});
+  }
   const DocSet& Set() const { return set_; }
   DocSet TakeSet() { return std::move(set_); }
   /// In ascending order of documents; those of several phrases follow each other.
   std::vector<WordHit> TakeHits();
 
  private:
-  size_t hits_max_;
-  const DocSet* hidden_;
+  void Shorten();
+
+  const size_t hits_max_;
+  size_t shorten_at_;
+  const Visible& visible_;
   DocSet set_;
   std::vector<WordHit> hits_;
 };

@@ -77,7 +77,7 @@ std::optional<std::chrono::steady_clock::time_point> SqliteStore::NextGiveBack()
 }
 
 void SqliteStore::GiveBack(std::chrono::steady_clock::time_point now) {
-  readers_.SharedPlaces().GiveBack(now);
+  readers_.GiveBack(now);
   if (const auto listed = catalogue_.Listed().Used(); listed.has_value() && now >= *listed + PlacesCache::kIdle)
     catalogue_.Listed().Forget();
 }

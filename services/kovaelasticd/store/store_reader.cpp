@@ -12,8 +12,12 @@ constexpr size_t kIdleMax = 4;
 
 }  // namespace
 
-StoreReader::StoreReader(const std::string& path, HiddenDocuments& hidden_documents, PlacesCache& shared_places)
-    : database(path, Database::Mode::kRead), places(shared_places), hidden_documents_(hidden_documents) {
+StoreReader::StoreReader(const std::string& path, HiddenDocuments& hidden_documents, PlacesCache& shared_places,
+                         ReadableCache& shared_readable)
+    : database(path, Database::Mode::kRead),
+      places(shared_places),
+      readable(shared_readable),
+      hidden_documents_(hidden_documents) {
   database.Execute("PRAGMA cache_size = -8192");
   RegisterFullText(database);
   database.Execute("CREATE VIRTUAL TABLE temp.meta_terms USING fts5vocab('main', 'meta_fts', 'instance')");
@@ -39,12 +43,17 @@ std::unique_ptr<StoreReader> ReaderPool::Borrow() {
       return reader;
     }
   }
-  return std::make_unique<StoreReader>(path_, hidden_documents_, places_);
+  return std::make_unique<StoreReader>(path_, hidden_documents_, places_, readable_);
 }
 
 void ReaderPool::Return(std::unique_ptr<StoreReader> reader) {
   const base::MutexLock guard(mutex_);
   if (idle_.size() < kIdleMax) idle_.push_back(std::move(reader));
+}
+
+void ReaderPool::GiveBack(PlacesCache::SteadyClock::time_point now) {
+  places_.GiveBack(now);
+  if (!places_.IsLoaded()) readable_.GiveBack();
 }
 
 }  // namespace ferrox::engine

@@ -11,6 +11,7 @@
 #include "services/kovaelasticd/store/hidden_documents.h"
 #include "services/kovaelasticd/store/older_format.h"
 #include "services/kovaelasticd/store/places_cache.h"
+#include "services/kovaelasticd/store/readable_cache.h"
 #include "services/kovaelasticd/store/sqlite_db.h"
 #include "services/kovaelasticd/store/text_codec.h"
 
@@ -20,7 +21,8 @@ namespace ferrox::engine {
 /// thread at a time.
 struct StoreReader {
   /// What is shared with other readers, of the same file, must outlive this.
-  StoreReader(const std::string& path, HiddenDocuments& hidden_documents, PlacesCache& shared_places);
+  StoreReader(const std::string& path, HiddenDocuments& hidden_documents, PlacesCache& shared_places,
+              ReadableCache& shared_readable);
   /// To be called at the beginning of each transaction: learns what was committed since the last one.
   void Refresh();
 
@@ -30,7 +32,8 @@ struct StoreReader {
   TextCodec codec;
   /// Documents that are deleted but still in the tables; null when there are none.
   std::shared_ptr<const DocSet> hidden;
-  PlacesCache& places;  ///< of all readers of the index
+  PlacesCache& places;  ///< of all readers of the index, as is the next
+  ReadableCache& readable;
 
  private:
   HiddenDocuments& hidden_documents_;
@@ -48,13 +51,15 @@ class ReaderPool {
   std::unique_ptr<StoreReader> Borrow();
   /// Takes a connection back that has no transaction open. After a failure do not return it: it is closed then.
   void Return(std::unique_ptr<StoreReader> reader);
-  PlacesCache& SharedPlaces() { return places_; }
   const PlacesCache& SharedPlaces() const { return places_; }
+  /// What PlacesCache says, for all that searches have in memory.
+  void GiveBack(PlacesCache::SteadyClock::time_point now);
 
  private:
   const std::string path_;
   HiddenDocuments hidden_documents_;
   PlacesCache places_;
+  ReadableCache readable_;
   base::Mutex mutex_;
   std::vector<std::unique_ptr<StoreReader>> idle_ BASE_GUARDED_BY(mutex_);
 };

@@ -1,0 +1,56 @@
+#pragma once
+
+#include <cstdint>
+#include <memory>
+#include <optional>
+
+#include "services/kovaelasticd/store/asker.h"
+#include "services/kovaelasticd/store/doc_set.h"
+#include "services/kovaelasticd/store/places.h"
+#include "services/kovaelasticd/store/readable_documents.h"
+#include "services/kovaelasticd/store/store_rows.h"
+
+namespace ferrox::engine {
+
+struct StoreReader;
+
+/// The documents that exist for one search: for an ordinary user those that they may read, else all but those that are
+/// deleted and still in the tables. Every set and every hit of a search goes through this one before it is counted, so
+/// that nothing else tells of other documents. For one snapshot.
+class Visible {
+ public:
+  /// `reader`, which must outlive this, has a transaction open. `asker`: null for who may see everything.
+  /// @throws Error kEngineStorage.
+  Visible(StoreReader& reader, const Asker* asker);
+
+  bool Contains(int64_t id) const {
+    if (for_asker_) return readable_ != nullptr && readable_->Documents().Contains(id);
+    return hidden_ == nullptr || !hidden_->Contains(id);
+  }
+  /// Removes what is not visible.
+  void Trim(DocSet& documents) const;
+  DocSet All() const;
+
+  // Sums of the visible documents; lengths are rough for an asker (LengthOfClass).
+  int64_t Documents() const { return documents_; }
+  int64_t WithContent() const { return with_content_; }
+  int64_t TextBytes() const { return text_bytes_; }
+  int64_t Version() const { return version_; }  ///< of the snapshot
+
+  /// Whether an ordinary user asks: then no number of a document may decide what they see, since numbers tell of other
+  /// documents. PathKey decides in their place.
+  bool IsForAsker() const { return for_asker_; }
+  /// PathKeys; for an asker only.
+  uint64_t PathKey(int64_t id) const { return keys_.has_value() ? keys_->Of(id) : 0; }
+
+ private:
+  StoreReader& reader_;
+  const bool for_asker_;
+  const DocSet* const hidden_;
+  std::shared_ptr<const Places> places_;
+  std::shared_ptr<const ReadableDocuments> readable_;  ///< null for an asker: nothing is readable
+  std::optional<PathKeys> keys_;
+  int64_t documents_ = 0, with_content_ = 0, text_bytes_ = 0, version_ = 0;
+};
+
+}  // namespace ferrox::engine
