@@ -32,6 +32,8 @@ struct IndexShare {
   std::string root;          ///< its folder
   std::string refused = {};  ///< why ordinary users may not search it; "": they may
   Json::Value rules = {};    ///< an object; null: none are known
+
+  bool operator==(const IndexShare& other) const = default;
 };
 Json::Value IndexShareRequest(const std::string& index_id, IndexShare share);
 /// All indices; with their figures, for which the engine opens each, or without.

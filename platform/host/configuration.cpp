@@ -48,9 +48,11 @@ Configuration Load(const std::string& path) {
 
 }  // namespace
 
+std::string ConfigurationPath() { return InstanceRoot() + "/etc/kova/kova.json"; }
+
 std::shared_ptr<const Configuration> GetConfiguration() {
   static auto* cache = new StatCache<Configuration>;  // never freed, like the share table
-  const std::string path = InstanceRoot() + "/etc/kova/kova.json";
+  const std::string path = ConfigurationPath();
   std::shared_ptr<const Configuration> configuration = cache->Get(path, &Load);
   if (!configuration->problem.empty()) {
     LogChange(LOG_ERR, path,

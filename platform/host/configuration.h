@@ -26,6 +26,9 @@ struct Configuration {
   std::string problem = {};  ///< why the file cannot be used, for people; empty when it can
 };
 
+/// Where the file of this instance is.
+std::string ConfigurationPath();
+
 /// The present configuration, re-read when its file has changed; a missing file is a configuration of defaults.
 /// A `problem` is logged when it is found.
 std::shared_ptr<const Configuration> GetConfiguration();

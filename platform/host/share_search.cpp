@@ -1,10 +1,14 @@
 #include "platform/host/share_search.h"
 
+#include <unistd.h>
+
 #include <memory>
 #include <vector>
 
 #include <kova/fs.h>
 
+#include "base/path.h"
+#include "platform/host/configuration.h"
 #include "platform/host/mounts.h"
 #include "platform/host/share_table.h"
 
@@ -56,6 +60,14 @@ std::string FileSystemRightsProblem(int type, const std::string& mounted_type, c
     return "the file system " + mounted_type + " keeps no rights of files";
   }
   return {};
+}
+
+std::vector<std::string> FilesOfShares() {
+  const std::shared_ptr<const Configuration> configuration = GetConfiguration();
+  std::vector<std::string> files = {ShareTablePath(), ConfigurationPath()};
+  const std::string& samba = configuration->samba.config;
+  if (configuration->samba.shares && access(base::FolderOf(samba).c_str(), F_OK) == 0) files.push_back(samba);
+  return files;
 }
 
 bool FindShareForSearch(const std::string& name, ShareForSearch& found) {

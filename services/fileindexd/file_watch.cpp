@@ -49,12 +49,13 @@ void FileWatch::Watch(const std::string& path) {
   Log(LOG_WARNING, "%s cannot be watched (%m), it is looked at now and then", path.c_str());
 }
 
-void FileWatch::Wait(std::chrono::milliseconds limit) {
+bool FileWatch::Wait(std::chrono::milliseconds limit) {
   const auto end = SteadyClock::now() + limit;
   while (WaitReadable(inotify_.Get(), wake_.Get(), end)) {
     const bool woken = DrainWake(wake_.Get());
-    if (DrainEvents() || woken) return;
+    if (DrainEvents() || woken) return true;
   }
+  return false;
 }
 
 void FileWatch::WaitForWake(std::chrono::milliseconds limit) {

@@ -19,8 +19,8 @@ class FileWatch {
   explicit FileWatch(const std::vector<std::string>& paths);
 
   /// Returns after a change of one of the files, after Wake, or after `limit`; a change or a Wake since the last wait
-  /// counts.
-  void Wait(std::chrono::milliseconds limit);
+  /// counts. @return whether it did not take the whole time.
+  bool Wait(std::chrono::milliseconds limit);
   /// The same for Wake alone.
   void WaitForWake(std::chrono::milliseconds limit);
   void Wake();

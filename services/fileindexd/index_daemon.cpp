@@ -80,14 +80,15 @@ constexpr IndexDaemon::Command IndexDaemon::kCommands[] = {
 
 IndexDaemon::IndexDaemon(const Options& options)
     : pool_(ThreadsFor(options.workers)),
-      workers_([this, is_mount_point = options.is_mount_point,
-                mounts_below = options.mounts_below](const std::string& share) {
+      workers_([this, options](const std::string& share) {
         WorkerEnvironment environment{pool_, pause_};
-        environment.is_mount_point = is_mount_point;
-        environment.mounts_below = mounts_below;
+        environment.is_mount_point = options.is_mount_point;
+        environment.mounts_below = options.mounts_below;
+        environment.describe_share = options.describe_share;
         return std::make_unique<ShareWorker>(share, environment);
       }),
-      configuration_(FilesOf(options)) {
+      configuration_(FilesOf(options)),
+      on_share_change_(options.on_share_change) {
   AllowManyOpenFiles();
 }
 
@@ -111,9 +112,11 @@ void IndexDaemon::Start() {
 /// Not every operation that changes shares or folders sends a command.
 void IndexDaemon::FollowConfiguration() {
   while (!stopping_) {
-    configuration_.Wait(configuration_.LongestWait());
+    const bool changed = configuration_.Wait(configuration_.LongestWait());
     if (stopping_) return;
+    if (changed) on_share_change_();
     Reconcile();
+    if (changed) workers_.WakeAll();  // the rules of a share that stays may have changed
     workers_.CheckIndices(SharesBeingRebuilt());
   }
 }

@@ -1,6 +1,7 @@
 #pragma once
 
 #include <atomic>
+#include <functional>
 #include <string>
 #include <thread>
 #include <vector>
@@ -32,8 +33,11 @@ class IndexDaemon {
     unsigned workers = 0;
     /// Files that change when shares do; without them that is noticed at intervals.
     std::vector<std::string> share_files = {};
+    /// Called when one of these has changed, before the shares are looked at.
+    std::function<void()> on_share_change = [] {};
     IsMountPoint is_mount_point = &NothingMounted;
     MountsBelow mounts_below = &NoMounts;
+    DescribeShare describe_share = [](const std::string&) { return std::nullopt; };
   };
 
   explicit IndexDaemon(const Options& options);
@@ -72,6 +76,7 @@ class IndexDaemon {
   WorkerSet workers_;
   WatchRegistrations registrations_;
   FileWatch configuration_;
+  const std::function<void()> on_share_change_;
   std::atomic<unsigned> syncs_{0};
   std::atomic<bool> syncs_ended_{false};
   std::atomic<bool> stopping_{false};

@@ -17,7 +17,22 @@
 namespace ferrox::indexd {
 
 IndexKeeper::IndexKeeper(ShareContext& context)
-    : context_(context), index_(context.environment.open_index(context.share)) {}
+    : context_(context),
+      index_(context.environment.open_index(context.share)),
+      note_(context.share, context.root, *index_, context.environment.describe_share) {}
+
+void IndexKeeper::TellShare() {
+  if (check_requested_) note_.Forget();
+  note_.Tell();
+}
+
+void IndexKeeper::TryToTellShare() {
+  try {
+    TellShare();
+  } catch (const Error&) {
+    // Logged; a round, or the next wake, tries again.
+  }
+}
 
 void IndexKeeper::EnsureExists(bool may_create) {
   if (exists_) return;
@@ -35,6 +50,7 @@ void IndexKeeper::CompareUnlessAccessIsRecorded() {
   if (access_is_recorded_) return;
   const uint64_t without = index_->WithoutAccess();
   access_is_recorded_ = without == 0 || context_.queue.Add(fileindex::EVENT_REINDEX, context_.root);
+  prepares_ = without != 0 && access_is_recorded_;
   if (without == 0) return;
   Log(LOG_NOTICE, "%" PRIu64 " documents of share %s do not say who may read their files; they are compared", without,
       context_.share.c_str());
@@ -81,6 +97,12 @@ void IndexKeeper::FinishRebuilding() {
   rebuilding_ = 0;
   check_requested_ = true;  // another may have begun meanwhile
   context_.watch.Wake();
+}
+
+void IndexKeeper::FinishPreparing() {
+  if (!prepares_) return;
+  index_->EndPreparing();
+  prepares_ = false;
 }
 
 bool IndexKeeper::HoldsStrays() {

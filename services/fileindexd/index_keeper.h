@@ -28,6 +28,13 @@ class IndexKeeper {
   void EnsureExists(bool may_create);
   /// After a failed round: what was known of the index may not hold any more.
   void OnFailure(int code);
+  /// Tells the engine which share the index is of. @throws Error as the engine does.
+  void TellShare();
+  /// The same for a worker that does no rounds now; what the engine cannot be told is left for the next time.
+  void TryToTellShare();
+  /// Adds to the share's status who may not search it. From any thread.
+  void AddNoteTo(Json::Value& status) const { note_.AddTo(status); }
+
   /// Ends a pause of the index that no folder of the share is paused for: the paused ones were removed, or the
   /// operation that paused it was not finished. A failure is left for the next time.
   void ResumeUnlessFoldersPaused();
@@ -40,6 +47,8 @@ class IndexKeeper {
   void FollowRebuilding();
   /// Tells the engine that a rebuilding is complete, once a pass has brought the index in line with the folders.
   void FinishRebuilding();
+  /// Tells the engine that the comparison has ended that gives an index of an earlier version its records of rights.
+  void FinishPreparing();
 
   /// Whether the index that this worker took over holds documents that no folder wants, those of before the share was
   /// renamed or moved for example. Not asked again once there are none.
@@ -58,8 +67,10 @@ class IndexKeeper {
 
   ShareContext& context_;
   const std::unique_ptr<ShareIndex> index_;
+  ShareNote note_;
   bool exists_ = false;
   bool access_is_recorded_ = false;  ///< or a comparison that does it is queued
+  bool prepares_ = false;            ///< that comparison is queued or under way
   bool has_no_strays_ = false;
   std::atomic<bool> check_requested_{true};
   std::atomic<int64_t> rebuilding_{0};  ///< the one under way, as ShareIndex tells it; 0: none

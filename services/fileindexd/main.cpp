@@ -4,12 +4,15 @@
 #include <cstdio>
 #include <cstdlib>
 #include <exception>
+#include <optional>
+#include <string>
 
 #include <kova/log.h>
 
 #include "common/paths.h"
 #include "platform/host/mounts.h"
-#include "platform/host/share_table.h"
+#include "platform/host/samba_shares.h"
+#include "platform/host/share_search.h"
 #include "services/fileindexd/index_daemon.h"
 #include "services/support/daemon.h"
 
@@ -39,6 +42,12 @@ bool ParseArguments(int argc, char** argv, ferrox::indexd::IndexDaemon::Options&
   return optind == argc;
 }
 
+std::optional<ferrox::wire::IndexShare> DescribeShare(const std::string& share) {
+  kova::host::ShareForSearch found;
+  if (!kova::host::FindShareForSearch(share, found)) return std::nullopt;
+  return ferrox::wire::IndexShare{share, found.root, found.refused, found.rules};
+}
+
 }  // namespace
 
 int main(int argc, char** argv) try {
@@ -51,7 +60,9 @@ int main(int argc, char** argv) try {
     return understood ? 0 : 2;
   }
   ferrox::services::Daemon daemon("fileindexd");
-  options.share_files = {kova::host::ShareTablePath()};
+  options.share_files = kova::host::FilesOfShares();
+  options.on_share_change = &kova::host::ExpectSambaChange;
+  options.describe_share = &DescribeShare;
   options.is_mount_point = &kova::host::IsMountRoot;
   options.mounts_below = &kova::host::MountsBelow;
   ferrox::indexd::IndexDaemon index_daemon(options);

@@ -13,6 +13,7 @@
 #include "services/fileindexd/pause_state.h"
 #include "services/fileindexd/queue_progress.h"
 #include "services/fileindexd/share_index.h"
+#include "services/fileindexd/share_note.h"
 #include "services/fileindexd/share_place.h"
 #include "services/fileindexd/share_queue.h"
 #include "services/fileindexd/share_status.h"
@@ -35,6 +36,8 @@ struct WorkerEnvironment {
   std::chrono::milliseconds patience = std::chrono::seconds(5);
   IsMountPoint is_mount_point = &NothingMounted;
   MountsBelow mounts_below = &NoMounts;
+  /// What the engine is told of a share.
+  DescribeShare describe_share = [](const std::string&) { return std::nullopt; };
   /// The interval at which the worker checks whether a volume that is away is back.
   std::chrono::milliseconds volume_poll = std::chrono::seconds(2);
 };

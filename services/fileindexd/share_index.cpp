@@ -98,6 +98,8 @@ class Engine : public ShareIndex {
     const Json::Value count = Stat()["without_access"];
     return count.isUInt64() ? count.asUInt64() : 0;
   }
+  void EndPreparing() override { elastic::SendRequest(Request("index_prepared")); }
+  void NoteShare(const wire::IndexShare& share) override { elastic::SendRequest(wire::IndexShareRequest(id_, share)); }
   void Delete(const std::vector<std::string>& paths, bool and_below) override {
     if (paths.size() == 1) {
       elastic::IndexDel(share_, paths.front());

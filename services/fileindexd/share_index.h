@@ -59,6 +59,10 @@ class ShareIndex {
   virtual AccessGaps SetAccess(const std::vector<wire::SeenAccess>& records) = 0;
   /// How many documents have no record of rights: an earlier version wrote them, or another program.
   virtual uint64_t WithoutAccess() = 0;
+  /// Those that can be recorded are: ordinary users may search an index of an earlier version from now on.
+  virtual void EndPreparing() = 0;
+  /// Which share the index is of, and who may search it.
+  virtual void NoteShare(const wire::IndexShare& share) = 0;
   /// Removes the documents at the paths, and, with `and_below`, all below them; in one request. Missing ones are no
   /// error.
   virtual void Delete(const std::vector<std::string>& paths, bool and_below) = 0;

@@ -27,6 +27,7 @@ void ShareRound::Run() {
   PrepareIndexAndQueue();
   RunPasses();
   keeper_.FinishRebuilding();
+  keeper_.FinishPreparing();
 }
 
 /// Makes sure of the index, and queues what is to be done although no other process queues an event for it.
@@ -36,6 +37,7 @@ void ShareRound::PrepareIndexAndQueue() {
   const ShareFolders folders = context_.folders.Load();
   keeper_.EnsureExists(
       retry_.HasFailedFor(Error::kEngineNoSuchIndex, context_.environment.patience, steady_clock::now()));
+  keeper_.TellShare();
   keeper_.FollowRebuilding();
   // No event says that indexed shares in this one came or went; a pass compares their folders.
   const bool is_queued = context_.queue.HasLines() || context_.queue.IsDetached();

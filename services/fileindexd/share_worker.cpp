@@ -108,6 +108,7 @@ std::string ShareWorker::AwaitSync(uint64_t request, QueueProgress::TimePoint en
 
 Json::Value ShareWorker::Status(milliseconds engine_wait) {
   Json::Value json = ReportShare(context_);
+  keeper_.AddNoteTo(json);
   json["index"] = keeper_.Figures(engine_wait);
   if (keeper_.ShowsUnknownRebuilding(json["index"])) CheckIndex();
   return json;

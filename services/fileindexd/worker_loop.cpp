@@ -42,6 +42,7 @@ void WorkerLoop::Run() {
     if (context_.environment.pause.Paused()) {
       context_.status.SetState(ShareStatus::State::kPaused);
       context_.syncs.Failed(context_.syncs.Last(), "indexing is paused; 'fileindexctl resume' resumes it");
+      keeper_.TryToTellShare();
       context_.watch.WaitForWake(context_.environment.pause.Left());
       continue;
     }
@@ -49,7 +50,7 @@ void WorkerLoop::Run() {
     if (!MayWork()) continue;
     const milliseconds wait = Round();
     if (!MayWork()) continue;
-    retry_.IsFailing() ? context_.watch.WaitForWake(wait) : context_.watch.Wait(wait);
+    retry_.IsFailing() ? context_.watch.WaitForWake(wait) : (void)context_.watch.Wait(wait);
   }
 }
 

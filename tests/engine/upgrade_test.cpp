@@ -105,6 +105,8 @@ TEST_F(UpgradeTest, AFileOfFormat2AnswersAsBeforeWhetherItsWordsAreTakenOverOrCu
     const StoreStat stat = store.Stat();
     EXPECT_EQ(stat.extract_error_examples.at("not text"), std::vector<std::string>{"/v/photo/notes.txt"});
     EXPECT_EQ(stat.without_access, 7);
+    EXPECT_TRUE(stat.preparing);
+    store.EndPreparing();
     store.Delete("/v/photo/2023/harbour.txt");
     Json::Value moved;
     moved["KOVAMDPath"] = "/v/pictures";
@@ -112,6 +114,7 @@ TEST_F(UpgradeTest, AFileOfFormat2AnswersAsBeforeWhetherItsWordsAreTakenOverOrCu
     store.Commit();
     EXPECT_EQ(FindPaths(store, "boats path:/v/pictures"), "/v/pictures/2023/b\n/v/pictures/notes.txt");
     EXPECT_EQ(FindPaths(store, "harbour"), "") << "its words could be taken out";
+    EXPECT_FALSE(store.Stat().preparing || store.Preparing()) << "the index daemon has said so";
   }
 }
 
@@ -126,11 +129,12 @@ TEST_F(UpgradeTest, AFileFromBeforeAccessRecordsTakesThem) {
     Database database(file, Database::Mode::kWrite);
     for (const char* table : {"docs", "folders"})
       database.Execute("ALTER TABLE " + std::string(table) + " DROP COLUMN access");
-    database.Execute("DROP TABLE access; DELETE FROM info WHERE key = 'without_access'");
+    database.Execute("DROP TABLE access; DELETE FROM info WHERE key IN ('without_access', 'preparing')");
   }
   for (const int64_t without : {1, 0}) {
     SqliteStore store(file, false, NoPaths());
     EXPECT_EQ(store.Stat().without_access, without);
+    EXPECT_EQ(store.Preparing(), without > 0);
     EXPECT_EQ(store.SetAccess({{"/v/a", "1.1.1.1", "0:0:0644"}}).differing.size(), 1U) << "it has no stamp";
     store.Commit();
   }

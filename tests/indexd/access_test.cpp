@@ -48,6 +48,39 @@ TEST_F(AccessTest, ChangesAreRecordedTogetherAndOnlyWhatDiffersIsRead) {
   EXPECT_EQ((std::multiset<size_t>{1000, 101, 1}), index->access_sets) << "one of them has the share's folder";
 }
 
+TEST_F(AccessTest, TheEngineIsToldWhoMaySearchTheShareAndWhenItIsReady) {
+  wire::IndexShare now = {share, root, "", Json::Value(Json::objectValue)};
+  describe_share = [&](const std::string&) { return now; };
+  worker = MakeWorker();
+  bool fails = true;
+  index->before_note = [&](const wire::IndexShare&) {
+    if (fails) throw Error(Error::kEngineStorage, "full");
+  };
+  EXPECT_THROW(worker->RunOnce(), Error);
+  fails = false;
+  for (int i = 0; i < 3; ++i) worker->RunOnce();
+  EXPECT_EQ(std::vector<std::string>{share + "|"}, index->notes) << "until it is told, and once";
+  now.refused = "no rights";
+  now.rules["closed"] = "a macro";
+  worker->RunOnce();
+  EXPECT_EQ(share + "|no rights", index->notes.back());
+  EXPECT_EQ("no rights", worker->Status()["refused"].asString());
+  EXPECT_EQ("a macro", worker->Status()["closed"].asString());
+  now = {share, "/elsewhere/" + share};
+  worker->RunOnce();
+  EXPECT_EQ(2U, index->notes.size()) << "its documents are not those of the new folder";
+
+  test::WriteFile(At("a"), "x");
+  Process(Line(kReindex, root));
+  EXPECT_EQ(0, index->prepared);
+  index->documents[At("a")].access.clear();
+  Restart();
+  index->after_access = [&](const std::vector<wire::SeenAccess>&) { EXPECT_EQ(0, index->prepared); };
+  for (int i = 0; i < 2; ++i) worker->RunOnce();
+  EXPECT_EQ(1, index->prepared);
+  EXPECT_EQ(OnDisk(At("a")), index->documents[At("a")].access);
+}
+
 TEST_F(AccessTest, RightsOvertakeContentUnderEachNameOfAFile) {
   early_write_interval = std::chrono::milliseconds(0);
   worker = MakeWorker();

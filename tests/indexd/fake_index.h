@@ -44,6 +44,11 @@ class FakeIndex : public indexd::ShareIndex {
   }
 
   void Resume() override { paused = false; }
+  void EndPreparing() override { ++prepared; }
+  void NoteShare(const wire::IndexShare& share) override {
+    if (before_note) before_note(share);
+    notes.push_back(share.share + "|" + share.refused);
+  }
   void Upsert(const std::string& path, bool need_meta) override {
     if (before_read) before_read(path);
     const Document document = {StampOf(path), need_meta, need_meta ? ContentOf(path) : "", AccessOf(path)};
@@ -168,6 +173,9 @@ class FakeIndex : public indexd::ShareIndex {
   int renames = 0;
   int lists = 0;
   int commits = 0;
+  int prepared = 0;
+  std::vector<std::string> notes;
+  std::function<void(const wire::IndexShare& share)> before_note;
   std::multiset<size_t> access_sets;                         ///< how many records each had
   std::function<void(const std::string& path)> before_read;  ///< by several threads
   std::function<void(const std::string& path)> after_read;   ///< by several threads

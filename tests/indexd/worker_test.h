@@ -83,6 +83,7 @@ class WorkerTest : public testing::Test {
     environment.patience = patience;
     environment.early_write_interval = early_write_interval;
     environment.is_mount_point = is_mount_point;
+    environment.describe_share = describe_share;
     environment.volume_poll = std::chrono::milliseconds(20);
     return std::make_unique<ShareWorker>(share, environment);
   }
@@ -150,6 +151,7 @@ class WorkerTest : public testing::Test {
   std::chrono::milliseconds patience{0};
   std::chrono::milliseconds early_write_interval{3600 * 1000};
   IsMountPoint is_mount_point = &NothingMounted;
+  DescribeShare describe_share = [](const std::string&) { return std::nullopt; };
   std::string share, root, queue_path;
   Folders configured;
   std::map<std::string, FakeIndex::Document> kept;

@@ -70,6 +70,13 @@ Json::Value OnIndexRebuilt(CommandCall& call) {
   return {};
 }
 
+Json::Value OnIndexPrepared(CommandCall& call) {
+  const Registry::OpenIndex open = call.registry.Open(IndexId(call.data));
+  open.index->Write([](IndexStore& store) { store.EndPreparing(); });
+  open.index->Commit();
+  return {};
+}
+
 /// What the share's name may be is left to the index daemon; it must be one that a path can hold.
 Json::Value OnIndexShare(CommandCall& call) {
   const std::string id = IndexId(call.data);
@@ -129,6 +136,7 @@ Json::Value OnIndexStat(CommandCall& call) {
   result["bytes_on_disk"] = Json::Int64(stat.bytes_on_disk);
   result["text_bytes"] = Json::Int64(stat.text_bytes);
   result["without_access"] = Json::Int64(stat.without_access);
+  if (stat.preparing) result["preparing"] = true;
   if (stat.clearing > 0) result["clearing"] = Json::Int64(stat.clearing);
   result["uncommitted"] = Json::Int64(open.index->Uncommitted());
   AddRebuilding(open.rebuild, result);
@@ -142,12 +150,17 @@ Json::Value OnIndexStat(CommandCall& call) {
   return result;
 }
 
-constexpr Command kIndexCommands[] = {
-    {"index_create", &OnIndexCreate, Users::kPrivileged},   {"index_pause", &OnIndexPause, Users::kPrivileged},
-    {"index_resume", &OnIndexResume, Users::kPrivileged},   {"index_delete", &OnIndexDelete, Users::kPrivileged},
-    {"index_rebuild", &OnIndexRebuild, Users::kPrivileged}, {"index_rebuilt", &OnIndexRebuilt, Users::kPrivileged},
-    {"index_share", &OnIndexShare, Users::kPrivileged},     {"index_config_set", &OnIndexConfigSet, Users::kPrivileged},
-    {"index_list", &OnIndexList, Users::kPrivileged},       {"index_stat", &OnIndexStat, Users::kPrivileged}};
+constexpr Command kIndexCommands[] = {{"index_create", &OnIndexCreate, Users::kPrivileged},
+                                      {"index_pause", &OnIndexPause, Users::kPrivileged},
+                                      {"index_resume", &OnIndexResume, Users::kPrivileged},
+                                      {"index_delete", &OnIndexDelete, Users::kPrivileged},
+                                      {"index_rebuild", &OnIndexRebuild, Users::kPrivileged},
+                                      {"index_rebuilt", &OnIndexRebuilt, Users::kPrivileged},
+                                      {"index_share", &OnIndexShare, Users::kPrivileged},
+                                      {"index_prepared", &OnIndexPrepared, Users::kPrivileged},
+                                      {"index_config_set", &OnIndexConfigSet, Users::kPrivileged},
+                                      {"index_list", &OnIndexList, Users::kPrivileged},
+                                      {"index_stat", &OnIndexStat, Users::kPrivileged}};
 
 }  // namespace
 

@@ -4,6 +4,8 @@
 #include <syslog.h>
 #include <unistd.h>
 
+#include <algorithm>
+
 #include "base/unique_fd.h"
 #include "common/log.h"
 #include "services/kovaelasticd/store/sqlite_db.h"
@@ -74,6 +76,17 @@ SearchReply Index::Search(const SearchRequest& request) {
 
 StoreStat Index::Stat() {
   return Reading([](auto& from) { return from.Stat(); });
+}
+
+std::optional<int> Index::PreparingPercent() {
+  {
+    const base::ReaderLock guard(store_mutex_);
+    if (store_ != nullptr && !store_->Preparing()) return std::nullopt;
+  }
+  const StoreStat stat = Stat();
+  if (!stat.preparing) return std::nullopt;
+  return static_cast<int>(
+      std::min<int64_t>(99, 100 - stat.without_access * 100 / std::max<int64_t>(1, stat.documents)));
 }
 
 std::optional<UpgradeProgress> Index::Upgrading() {

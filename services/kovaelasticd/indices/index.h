@@ -56,6 +56,9 @@ class Index {
   /// Search and Stat run on the caller's thread and see the last commit.
   SearchReply Search(const SearchRequest& request);
   StoreStat Stat();
+  /// While documents of an index that came without access records are still to be given theirs: how many of a hundred
+  /// have one, at most 99. Costs nothing otherwise.
+  std::optional<int> PreparingPercent();
   /// The number of changes that are not committed yet.
   int64_t Uncommitted() const { return uncommitted_; }
   /// Nothing when the index has the present format.

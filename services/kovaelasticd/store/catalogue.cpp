@@ -46,6 +46,7 @@ void Catalogue::Begin() {
 
 void Catalogue::Commit() {
   places_.Flush(++totals_.version);
+  totals_.preparing = totals_.preparing && totals_.without_access > 0;
   SaveTotals(database_, totals_);
   database_.Execute("COMMIT");
   in_transaction_ = false;

@@ -73,6 +73,7 @@ struct StoreStat {
   int64_t bytes_on_disk = 0;   ///< of all its files
   int64_t text_bytes = 0;      ///< of all texts, unpacked
   int64_t without_access = 0;  ///< documents that have no access record
+  bool preparing = false;      ///< it came without access records: those without are still to be given theirs
   int64_t clearing = 0;        ///< documents that are deleted, but whose words are still to be taken out (ClearSome)
   std::map<std::string, int64_t> extract_errors;  ///< documents for each reason why content could not be read
   std::map<std::string, std::vector<std::string>> extract_error_examples;  ///< of each reason, one or two paths
@@ -119,6 +120,8 @@ class IndexStore {
   /// and where there is none, that of a folder at the path. Stamps and records must be well-formed. Cheap, unless owner
   /// or group change: they are searched for.
   virtual AccessReport SetAccess(const std::vector<AccessChange>& changes) = 0;
+  /// The index came without access records (Preparing), and all that can be had of them are there now.
+  virtual void EndPreparing() = 0;
   virtual void Delete(const std::string& path) = 0;
   /// Large folders cost no more than a look at the rows of their documents. Their words are left to ClearSome.
   virtual void DeletePrefix(const std::string& prefix) = 0;
@@ -146,6 +149,8 @@ class IndexStore {
 
   virtual SearchReply Search(const SearchRequest& request) = 0;
   virtual StoreStat Stat() = 0;
+  /// StoreStat::preparing at no cost, as of the last commit. For any thread.
+  virtual bool Preparing() const = 0;
 };
 
 }  // namespace ferrox::engine

@@ -18,6 +18,7 @@ void SqliteStore::Commit() {
   words_.Flush();
   catalogue_.Commit();
   uncommitted_bytes_ = 0;
+  preparing_ = catalogue_.Sums().preparing;
 }
 
 void SqliteStore::Rollback() {
@@ -80,6 +81,13 @@ void SqliteStore::GiveBack(std::chrono::steady_clock::time_point now) {
   readers_.GiveBack(now);
   if (const auto listed = catalogue_.Listed().Used(); listed.has_value() && now >= *listed + PlacesCache::kIdle)
     catalogue_.Listed().Forget();
+}
+
+void SqliteStore::EndPreparing() {
+  if (!catalogue_.Sums().preparing) return;
+  catalogue_.Begin();
+  catalogue_.Sums().preparing = false;
+  Changed(0);
 }
 
 StoreStat SqliteStore::Stat() { return ReadStat(readers_); }

@@ -1,5 +1,6 @@
 #pragma once
 
+#include <atomic>
 #include <chrono>
 #include <memory>
 #include <optional>
@@ -29,6 +30,7 @@ class SqliteStore : public IndexStore {
   void Set(const std::string& path, const Json::Value& changes) override;
   void MoveFolder(const std::string& path, const std::string& stamp, const Json::Value& changes) override;
   AccessReport SetAccess(const std::vector<AccessChange>& changes) override;
+  void EndPreparing() override;
   void Delete(const std::string& path) override;
   void DeletePrefix(const std::string& prefix) override;
   void Get(const GetRequest& request, const std::function<void(Json::Value)>& take) override;
@@ -42,6 +44,7 @@ class SqliteStore : public IndexStore {
   void RebuildSuggestions() override;
   SearchReply Search(const SearchRequest& request) override;  ///< defined in search/, whose parts it is made of
   StoreStat Stat() override;
+  bool Preparing() const override { return preparing_; }
 
   /// The largest size of the file, in pages; for tests of a full disk. 0: no limit.
   void LimitPages(int64_t pages);
@@ -66,6 +69,7 @@ class SqliteStore : public IndexStore {
   Clearing clearing_{catalogue_, words_};
   int64_t uncommitted_bytes_ = 0;    ///< for the automatic commit: texts, and a fixed amount for each change
   bool suggestions_wanted_ = false;  ///< once nothing is left to be cleared
+  std::atomic<bool> preparing_{catalogue_.Sums().preparing};
 
   ReaderPool readers_;  ///< for Search and Stat, on any thread
 };

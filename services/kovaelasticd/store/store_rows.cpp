@@ -74,7 +74,7 @@ void AddDocumentsIn(Database& database, const std::vector<int64_t>& folders, Doc
 
 Totals LoadTotals(Database& database) {
   Totals totals;
-  std::optional<int64_t> without_access, last_id;  // a file from before these were kept has none
+  std::optional<int64_t> without_access, preparing, last_id;  // a file from before these were kept has none
   Statement statement = database.Prepare("SELECT key, value FROM info");
   while (statement.Step()) {
     const std::string_view key = statement.Text(0);
@@ -83,10 +83,12 @@ Totals LoadTotals(Database& database) {
     if (key == "text_bytes") totals.text_bytes = statement.Int(1);
     if (key == "version") totals.version = statement.Int(1);
     if (key == "without_access") without_access = statement.Int(1);
+    if (key == "preparing") preparing = statement.Int(1);
     if (key == "last_id") last_id = statement.Int(1);
     if (key == "clearing") totals.clearing = statement.Int(1);
   }
   totals.without_access = without_access.value_or(totals.documents);
+  totals.preparing = preparing.value_or(1) != 0 && totals.without_access > 0;
   totals.last_id = last_id.has_value() ? *last_id : database.QueryInt("SELECT max(id) FROM docs");
   return totals;
 }
@@ -96,7 +98,7 @@ void SaveTotals(Database& database, const Totals& totals) {
       {"documents", totals.documents},   {"with_content", totals.with_content},
       {"text_bytes", totals.text_bytes}, {"without_access", totals.without_access},
       {"version", totals.version},       {"last_id", totals.last_id},
-      {"clearing", totals.clearing}};
+      {"clearing", totals.clearing},     {"preparing", totals.preparing ? 1 : 0}};
   Statement statement = database.Prepare("INSERT OR REPLACE INTO info(key, value) VALUES(?1, ?2)");
   for (const auto& [key, value] : values) statement.Bind(1, key).Bind(2, value).Run();
 }

@@ -30,6 +30,7 @@ struct Totals {
   int64_t text_bytes = 0;
   int64_t version = 0;         ///< the number of commits that have changed it
   int64_t without_access = 0;  ///< documents that have no access record
+  bool preparing = false;      ///< it came without access records, and is being given them
   int64_t last_id = 0;         ///< the highest number that a document got; none is given again
   int64_t clearing = 0;        ///< documents that count nowhere else any more, but are still to be cleared (Clearing)
 };

@@ -53,6 +53,7 @@ StoreStat ReadStat(ReaderPool& readers) {
   stat.with_content = totals.with_content;
   stat.text_bytes = totals.text_bytes;
   stat.without_access = totals.without_access;
+  stat.preparing = totals.preparing;
   stat.clearing = totals.clearing;
   ReadFailures(*reader, stat);
   reader->database.Execute("COMMIT");
