@@ -30,7 +30,7 @@ Json::Value OnPing(CommandCall& /*call*/) {
 constexpr Command kOtherCommands[] = {{"access_set", &RunAccessSet, Users::kPrivileged},
                                       {"commit", &OnCommit, Users::kPrivileged},
                                       {"update_term_suggestion", &OnUpdateTermSuggestion, Users::kPrivileged},
-                                      {"search", &RunSearch, Users::kPrivileged},
+                                      {"search", &RunSearch, Users::kEveryone},
                                       {"ping", &OnPing, Users::kEveryone}};
 
 }  // namespace

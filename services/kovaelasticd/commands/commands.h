@@ -6,6 +6,7 @@
 #include <json/value.h>
 
 #include "services/kovaelasticd/commands/caller.h"
+#include "services/kovaelasticd/commands/live_look.h"
 #include "services/kovaelasticd/indices/registry.h"
 
 namespace ferrox::engine {
@@ -18,6 +19,7 @@ namespace ferrox::engine {
 struct CommandCall {
   Registry& registry;
   const Caller& caller;
+  const LookFunction& look;
   Json::Value& data;  ///< the request's "data", an object; the command may move values out of it
 };
 

@@ -106,7 +106,8 @@ Json::Value SuccessReply(Json::Value data) {
   return reply;
 }
 
-Engine::Engine(const std::string& state_folder) : registry_(state_folder), instance_owner_(InstanceOwner()) {}
+Engine::Engine(const std::string& state_folder, LookFunction look)
+    : registry_(state_folder), instance_owner_(InstanceOwner()), look_(std::move(look)) {}
 
 std::string Engine::Handle(const std::string& request, const services::Peer& peer) {
   const auto began = std::chrono::steady_clock::now();
@@ -145,8 +146,19 @@ std::string Engine::Answer(const std::string& request, const Caller& caller) {
   if (parsed.isMember("compound")) throw Error(Error::kEngineBadRequest, kShapeText);
   const Command& command = KnownCommand(parsed);
   RequireRights(command, caller);
-  CommandCall call{registry_, caller, DataOf(parsed)};
-  return toString(SuccessReply(command.run(call)));
+  return toString(Run(command, caller, parsed));
+}
+
+/// Who asks as an ordinary user is told of failures what that user is.
+Json::Value Engine::Run(const Command& command, const Caller& caller, Json::Value& part) {
+  CommandCall call{registry_, caller, look_, DataOf(part)};
+  const bool as_user = command.users == Users::kEveryone && !call.data["as"].isNull();
+  try {
+    return SuccessReply(command.run(call));
+  } catch (const Error& error) {
+    if (!as_user) throw;
+    throw UserError(error.Code(), SentenceForUsers(error));
+  }
 }
 
 /// The parts in order; neighbours that change documents of one index are carried out in one go.
@@ -162,10 +174,8 @@ std::string Engine::AnswerCompound(CompoundParts& parts, const Caller& caller) {
     const std::string name = part["command"].asString();
     // One rebuilding serves all the documents that are named.
     const bool repeated = name == "update_term_suggestion" && suggestions_done;
-    const Json::Value answer = repeated ? SuccessReply(Json::Value()) : ReplyOf(caller, [&] {
-      CommandCall call{registry_, caller, DataOf(part)};
-      return SuccessReply(FindCommand(name)->run(call));
-    });
+    const Json::Value answer =
+        repeated ? SuccessReply(Json::Value()) : ReplyOf(caller, [&] { return Run(*FindCommand(name), caller, part); });
     suggestions_done = suggestions_done || (name == "update_term_suggestion" && !Failed(answer));
     reply.Add(answer);
   }

@@ -23,8 +23,8 @@ class Engine {
  public:
   static constexpr std::chrono::milliseconds kStep{5};
 
-  /// Loads the indices that are noted in `state_folder`. @throws Error kInternal.
-  explicit Engine(const std::string& state_folder);
+  /// Loads the indices that are noted in `state_folder`. `look` is called by any thread. @throws Error kInternal.
+  explicit Engine(const std::string& state_folder, LookFunction look = &LookOnDisk);
 
   /// One request to one reply, whatever the request holds. What an ordinary user is told leaves at the next full kStep
   /// since the call, so that its time tells less of what others have.
@@ -33,11 +33,13 @@ class Engine {
  private:
   std::string Answer(const std::string& request, const Caller& caller);
   void RequireRights(const Command& command, const Caller& caller) const;
+  Json::Value Run(const Command& command, const Caller& caller, Json::Value& part);
   std::string AnswerCompound(CompoundParts& parts, const Caller& caller);
   void AnswerChanges(CompoundParts& compound, const Caller& caller, CompoundReply& reply);
 
   Registry registry_;
   const uint32_t instance_owner_;
+  const LookFunction look_;
 };
 
 }  // namespace ferrox::engine

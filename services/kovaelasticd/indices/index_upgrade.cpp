@@ -105,7 +105,11 @@ std::unique_ptr<IndexStore> IndexUpgrade::Finish() {
   return std::make_unique<SqliteStore>(path_, false, schema_);
 }
 
-SearchReply IndexUpgrade::Search(const SearchRequest& request) { return SearchIn(*readers_, request); }
+SearchReply IndexUpgrade::Search(const SearchRequest& request) {
+  // The old file need not know who may read what.
+  FERROX_FAIL_IF(request.asker != nullptr, Error::kEngineIndexPreparing, DescribeUpgrade(Progress()));
+  return SearchIn(*readers_, request);
+}
 
 StoreStat IndexUpgrade::Stat() { return ReadStat(*readers_); }
 

@@ -1,0 +1,35 @@
+#pragma once
+
+#include <optional>
+#include <string>
+#include <vector>
+
+#include <json/value.h>
+
+#include "services/kovaelasticd/commands/commands.h"
+#include "services/kovaelasticd/indices/registry.h"
+#include "services/kovaelasticd/store/asker.h"
+
+namespace ferrox::engine {
+
+/// A share that an asker can enter. Others do not exist for the asker.
+struct EnteredShare {
+  std::string index_id;
+  ShareNotePtr note;
+  bool paused;
+  Asker asker;  ///< with this share's root
+};
+
+/// The member "shares", each name once; nothing when it is absent. @throws Error kEngineBadRequest.
+std::optional<std::vector<std::string>> ReadShareNames(const Json::Value& data);
+
+/// The shares that the asker can enter now, those that are refused to ordinary users among them: of the `named` ones in
+/// their order, else of all in the order of their indices' ids.
+/// @throws Error kEngineNoSuchIndex when one that is named cannot be entered, or is none; kEngineRightsUnknown.
+std::vector<EnteredShare> EnteredShares(const CommandCall& call, const Asker& asker,
+                                        const std::optional<std::vector<std::string>>& named);
+
+/// kEngineNoSuchIndex; the same whether there is no such share, or the asker cannot enter it.
+[[noreturn]] void RefuseShare(const std::string& name);
+
+}  // namespace ferrox::engine
