@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <future>
 
+#include "cli/caller.h"
 #include "cli/command.h"
 #include "cli/format.h"
 #include "cli/rights.h"
@@ -48,10 +49,10 @@ Json::Value DataOf(const Daemon& daemon, wire::Reply reply) {
     case Outcome::kAnswered:
       return std::move(reply.data);
     case Outcome::kNotRunning:
-      throw Failure(name + " does not run here (nothing answers at " + InstancePath(daemon.socket) +
-                    "); start it with 'fileindexctl up'" + code);
+      throw Failure(name + " does not run here (nothing answers at " + InstancePath(daemon.socket) + "); " +
+                    (IsPrivileged() ? "start it" : "its administrator starts it") + " with 'fileindexctl up'" + code);
     case Outcome::kNotPermitted:
-      throw MayNot("use", InstancePath(daemon.socket));
+      throw MayNotConnect(InstancePath(daemon.socket));
     case Outcome::kNoAnswer:
     case Outcome::kPeerClosed:
       throw Failure(name + " " + kNoAnswer + code);
@@ -60,7 +61,11 @@ Json::Value DataOf(const Daemon& daemon, wire::Reply reply) {
     case Outcome::kRefused:
       break;
   }
-  if (reply.code == Error::kEngineNotPermitted) throw MayNot("use", InstancePath(daemon.socket));
+  if (reply.code == Error::kEngineNotPermitted) {
+    // The engine says to whom its answer is not given; the other daemons answer root and the instance's owner alone.
+    if (daemon.socket == kEngine.socket && !reply.message.empty()) throw NotPermitted(reply.message);
+    throw MayNot("use", InstancePath(daemon.socket));
+  }
   throw Refusal(daemon.name, reply.code, reply.message.empty() ? "the request failed" : reply.message);
 }
 
@@ -68,10 +73,6 @@ Json::Value DataOf(const Daemon& daemon, wire::Reply reply) {
 wire::Reply SendCommand(const Daemon& daemon, const std::string& type, const Json::Value& data,
                         std::chrono::seconds longest = kLongestWait) {
   return wire::AskDaemon(daemon.socket, type, data, longest);
-}
-
-Json::Value AskWithin(const Json::Value& request, std::chrono::seconds longest) {
-  return DataOf(kEngine, wire::AskEngine(request, longest));
 }
 
 /// A daemon that does not run has neither a status nor a problem: whether that matters depends on what is indexed.
@@ -110,9 +111,13 @@ std::string WhyBehind(const std::vector<std::string>& shares, std::chrono::milli
 
 }  // namespace
 
-Json::Value AskEngine(const Json::Value& request) { return AskWithin(request, kLongestWait); }
+Json::Value AskEngine(const Json::Value& request, std::chrono::seconds longest) {
+  return DataOf(kEngine, wire::AskEngine(request, longest));
+}
 
-Json::Value Search(const Json::Value& data) { return AskWithin(wire::EngineRequest("search", data), kSearchWait); }
+Json::Value AskEngine(const Json::Value& request) { return AskEngine(request, kLongestWait); }
+
+Json::Value Search(const Json::Value& data) { return AskEngine(wire::EngineRequest("search", data), kSearchWait); }
 
 Json::Value AskIndexDaemon(const std::string& type, const Json::Value& data) {
   return DataOf(kIndexDaemon, SendCommand(kIndexDaemon, type, data));
@@ -174,7 +179,7 @@ std::map<std::string, std::string> AwaitChanges(const std::vector<std::string>& 
 }
 
 /// Waits less than for other commands: it is asked before anything is changed, so that giving up costs nothing.
-void RequireEngine() { (void)AskWithin(wire::EngineRequest("ping"), kStateWait); }
+void RequireEngine() { (void)AskEngine(wire::EngineRequest("ping"), kStateWait); }
 
 void RequireIndexDaemon() { (void)AskIndexDaemon("status", Json::Value()); }
 

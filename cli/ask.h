@@ -17,6 +17,8 @@ namespace ferrox::cli {
 /// @throws Failure when the daemon does not run or does not answer; Refusal with its own message and code when it
 /// refuses; NotPermitted when its socket, or the daemon, does not take requests of the calling user.
 Json::Value AskEngine(const Json::Value& request);
+/// The same, waiting no longer than this.
+Json::Value AskEngine(const Json::Value& request, std::chrono::seconds longest);
 /// The engine's "search".
 Json::Value Search(const Json::Value& data);
 Json::Value AskIndexDaemon(const std::string& type, const Json::Value& data);

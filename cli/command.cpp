@@ -47,6 +47,7 @@ void TakeOption(const Command& command, const std::vector<std::string>& given, s
     arguments.options[name] = given[++at];
   }
   if (option->value != nullptr) CheckChoice(*option, arguments.options[name]);
+  arguments.given.emplace_back(name, arguments.options[name]);
 }
 
 /// How many words a command takes, read from its usage: "[...]" may be left out, "..." may be repeated.
@@ -83,6 +84,14 @@ std::vector<std::string> Split(const std::string& text, char separator) {
 std::string Arguments::Get(const std::string& name, const std::string& otherwise) const {
   const auto found = options.find(name);
   return found == options.end() ? otherwise : found->second;
+}
+
+std::vector<std::string> Arguments::All(const std::string& name) const {
+  std::vector<std::string> values;
+  for (const auto& [option, value] : given) {
+    if (option == name) values.push_back(value);
+  }
+  return values;
 }
 
 long long Arguments::Number(const std::string& name, long long otherwise, long long least, long long most) const {

@@ -3,6 +3,7 @@
 #include <map>
 #include <stdexcept>
 #include <string>
+#include <utility>
 #include <vector>
 
 namespace ferrox::cli {
@@ -69,11 +70,14 @@ struct Option {
 
 /// What was given to a command, sorted by ParseArguments.
 struct Arguments {
-  std::vector<std::string> words;              ///< in their order, the command's own name not among them
-  std::map<std::string, std::string> options;  ///< by name, "--limit"; "" for one that takes no value
+  std::vector<std::string> words;                          ///< in their order, the command's own name not among them
+  std::map<std::string, std::string> options;              ///< by name, "--limit"; "" for one that takes no value
+  std::vector<std::pair<std::string, std::string>> given;  ///< all options as they came, for those that may be repeated
 
   bool Has(const std::string& name) const { return options.count(name) != 0; }
   std::string Get(const std::string& name, const std::string& otherwise = "") const;
+  /// The values of an option that may be repeated, in their order.
+  std::vector<std::string> All(const std::string& name) const;
   /// A number from `least` to `most`. @throws UsageError.
   long long Number(const std::string& name, long long otherwise, long long least, long long most) const;
 };
@@ -86,6 +90,8 @@ struct Command {
   const char* help;
   int (*run)(const Arguments& arguments);  ///< @return an ExitCode; throws what main() turns into one
   Needs needs = Needs::kReading;
+  /// What the command does for an ordinary user (caller.h); null: it is not for them.
+  int (*run_for_user)(const Arguments& arguments) = nullptr;
 };
 
 /// Sorts a command's words and options, and checks how many words there are and the options of which the table lists

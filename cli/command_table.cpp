@@ -1,5 +1,7 @@
 #include "cli/command_table.h"
 
+#include "cli/user_commands.h"
+
 /// The commands as data. A row that is added here has help, usage line, checks of its options and completion at once;
 /// the manual (docs/man) must name it, too, which a test holds.
 namespace ferrox::cli {
@@ -25,7 +27,9 @@ CommandGroup Services() {
                "",
                {kJson},
                "Shows what runs, and for each share what is indexed, queued and failed.",
-               &RunStatus},
+               &RunStatus,
+               Needs::kReading,
+               &RunUserStatus},
               {"pause",
                "[HOURS]",
                {},
@@ -48,7 +52,7 @@ CommandGroup Searching() {
       {
           {"search",
            "QUERY...",
-           {{"--share", "SHARE", "search in this share only"},
+           {{"--share", "SHARE", "search in this share only; may be given several times"},
             {"--limit", "N", "show at most so many hits (default 10, at most 1000)"},
             {"--offset", "N", "leave out the first N hits"},
             {"--sort", "relevance|date|name|size", "the order (default: relevance)"},
@@ -59,7 +63,9 @@ CommandGroup Searching() {
            "Finds files. All words must match; \"a phrase\", prefix*, OR, NOT and ( ) work, and conditions such as "
            "kind:image, size:>10M, author:, artist:, duration:>10m, camera:, taken:2023; the manual lists all. "
            "Exit code 4: a share was left out.",
-           &RunSearch},
+           &RunSearch,
+           Needs::kReading,
+           &RunUserSearch},
           {"suggest-refresh",
            "[SHARE...]",
            {},
@@ -234,7 +240,8 @@ CommandGroup Inspection() {
                "Shows what the index holds of a file: what was read, by which reader, all fields, and the text's "
                "beginning.",
                &RunShow,
-               Needs::kAnswers},
+               Needs::kAnswers,
+               &RunUserShow},
               {"unread",
                "[SHARE...]",
                {{"--json", nullptr, "one JSON object a line"}},

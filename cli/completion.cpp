@@ -7,6 +7,7 @@
 
 #include "base/files.h"
 #include "base/path.h"
+#include "cli/caller.h"
 #include "cli/command_table.h"
 #include "cli/folder_path.h"
 #include "cli/global_options.h"
@@ -67,6 +68,8 @@ Words Candidates(std::string name, const std::string& typed) {
   if (name.find('|') != std::string::npos) return Split(name, '|');
   while (!name.empty() && (name.back() == ']' || name.back() == '.')) name.pop_back();
   if (!name.empty() && name[0] == '[') name.erase(0, 1);
+  // Which shares and folders there are is read from files that are closed to ordinary users.
+  if (!IsPrivileged() && (name == "SHARE" || name == "PATH")) return {};
   if (name == "SHARE") return sdk::SDKShare::Enum();
   if (name == "PATH") return SharePaths(typed);
   if (name == "KINDS") return KindLists(typed);
@@ -80,6 +83,7 @@ Words CommandWords(const std::string& first) {
   Words found;
   for (const CommandGroup& group : CommandTable()) {
     for (const Command& command : group.commands) {
+      if (!MayUse(command)) continue;
       const Words name = Split(command.name, ' ');
       const std::string& word = first.empty() ? name[0] : name.back();
       if (!first.empty() && (name.size() < 2 || name[0] != first)) continue;

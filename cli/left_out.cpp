@@ -51,6 +51,20 @@ void LeftOut::Add(const std::string& share, int code, const std::string& reason,
   entry["code"] = code;
   entry["reason"] = reason;
   entry["searched"] = searched;
+  Put(std::move(entry));
+}
+
+void LeftOut::AddForUser(const std::string& share, int code, const std::string& reason, bool searched) {
+  Json::Value entry;
+  entry["share"] = share;
+  entry["code"] = code;
+  entry["reason"] = reason;
+  entry["searched"] = searched;
+  Put(std::move(entry));
+}
+
+void LeftOut::Put(Json::Value entry) {
+  const std::string share = TextOf(entry, "share");
   // The later reason is the one that counts: what was searched nevertheless may fail after all.
   for (Json::Value& earlier : list_) {
     if (earlier["share"] == share) return earlier.swap(entry);

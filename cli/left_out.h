@@ -19,6 +19,8 @@ class LeftOut {
   bool AddIfRebuilding(const std::string& share);
   /// Takes the entries of an engine's reply.
   void AddFrom(const Json::Value& reply);
+  /// As Add, for ordinary users, to whom the engine names shares and no indices.
+  void AddForUser(const std::string& share, int code, const std::string& reason, bool searched = false);
 
   /// Runs what concerns a share. Where the engine refuses, the share is left out and the command goes on with the next.
   /// @return whether `run` succeeded. @throws what `run` throws besides a refusal of the engine.
@@ -27,12 +29,14 @@ class LeftOut {
   /// How many were not searched at all.
   size_t Unsearched() const;
   bool Empty() const { return list_.empty(); }
-  /// An array of {"share", "id", "code", "reason", "searched"}, for scripts.
+  /// An array of {"share", "id", "code", "reason", "searched"}, for scripts; for ordinary users without "id".
   const Json::Value& ToJson() const { return list_; }
   /// Prints a line for each on standard error.
   void Warn() const;
 
  private:
+  void Put(Json::Value entry);
+
   Json::Value list_{Json::arrayValue};
 };
 

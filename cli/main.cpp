@@ -3,6 +3,7 @@
 #include <cstdio>
 
 #include "base/files.h"
+#include "cli/caller.h"
 #include "cli/command_table.h"
 #include "cli/completion.h"
 #include "cli/escape.h"
@@ -93,6 +94,7 @@ int Run(std::vector<std::string> words) {
       (void)fputs(HelpFor(*command).c_str(), stdout);
       return kDone;
     }
+    if (!IsPrivileged()) return RunForUser(*command, arguments);
     PrepareInstance(command->needs);
     return command->run(arguments);
   } catch (const UsageError& error) {

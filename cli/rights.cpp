@@ -11,6 +11,7 @@
 
 #include <kova/instance.h>
 
+#include "cli/caller.h"
 #include "cli/output.h"
 #include "common/file_util.h"
 #include "common/paths.h"
@@ -74,6 +75,16 @@ NotPermitted MayNot(const std::string& act, const std::string& path) {
                       "; run '" + command +
                       "' with the same command, or work on an instance of your own ('--root' with a folder that you "
                       "may write)");
+}
+
+NotPermitted MayNotConnect(const std::string& socket) {
+  const std::string refusal = MayNot("use", socket).what();
+  if (IsPrivileged() || OwnerOf(socket) != 0) return NotPermitted(refusal);
+  struct stat status = {};
+  const bool is_seen = stat(socket.c_str(), &status) == 0;
+  return NotPermitted(refusal + "; for users to search, its administrator " +
+                      (is_seen ? "restarts a search engine of an earlier version ('fileindexctl down', 'up')"
+                               : "lets them enter the folders above it"));
 }
 
 void RequireShareTable(Needs needs) {

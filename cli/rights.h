@@ -11,6 +11,9 @@ namespace ferrox::cli {
 /// "user <name> may not <do> <path>, which belongs to <owner>; <the remedy>". `path` need not be reachable.
 NotPermitted MayNot(const std::string& act, const std::string& path);
 
+/// The same of a daemon's socket; to an ordinary user it says what lets users in.
+NotPermitted MayNotConnect(const std::string& socket);
+
 /// @throws NotPermitted for a command that may not be run; Failure when something else keeps the instance from being
 /// used.
 void RequireRights(Needs needs);

@@ -395,29 +395,76 @@ class ToolTest(unittest.TestCase):
             return sorted((folder, names, [os.stat(f"{folder}/{name}").st_mtime_ns for name in names])
                           for folder, _, names in os.walk(self.root))
 
-        def run(*words):
-            return subprocess.run([TOOL, *words], env=self.env, cwd="/", capture_output=True, timeout=60, check=False,
-                                  user=65534, group=65534, extra_groups=[])
-
+        run = self.run_as_nobody
         queue, words = f"{self.root}/queue", {"SHARE": "photo", "PATH": "/photo/trip", "NEW_NAME": "new"}
         write_json(queue, {})
         os.chmod(queue, 0o600)
         for name in ("kovaelasticd", "kovanotifyd", "fileindexd", "kovacontentextractd"):
             os.chmod(self.daemon(name).path, 0o600)
         before = contents()
-        for mode, readers in ((0o755, ["share list", "folder list", "folder get"]), (0o700, [])):
+        for mode in (0o755, 0o700):
             os.chmod(self.root, mode)
             for command in map(" ".join, self.commands()):
                 given = ["/photo/trip"] if command == "show" else self.given(command, words, queue)
                 done = run(*command.split(), *given)
                 with self.subTest(command=command, given=given, mode=mode):
-                    self.assertEqual(0 if command in readers else 5, done.returncode, done.stderr)
-                    if done.returncode:
-                        self.assertRegex(done.stderr.decode(), rf"^fileindexctl: user \w+ may not \w+ {self.root}\S*, which "
-                                         rf"belongs to root; run 'sudo fileindexctl --root {self.root}' .*'--root'")
+                    self.assertEqual(5, done.returncode, done.stderr)
+                    self.assertRegex(done.stderr.decode(), rf"^fileindexctl: user \w+ may not \w+ {self.root}\S*, which "
+                                     rf"belongs to root; run 'sudo fileindexctl --root {self.root}' .*'--root'")
         self.assertEqual(5, run("search", "--fresh", "x").returncode)
         self.assertEqual(5, run("folder", "list", "--status").returncode)
         self.assertEqual(before, contents())
+
+    def run_as_nobody(self, *words):
+        return subprocess.run([TOOL, *words], env=self.env, cwd="/", capture_output=True, timeout=60, check=False,
+                              user=65534, group=65534, extra_groups=[])
+
+    @unittest.skipUnless(os.geteuid() == 0, "takes on another user; needs root")
+    def test_other_users_get_what_the_engine_gives_them_and_read_no_file(self):
+        os.chmod(self.root, 0o755)
+        for closed in ("etc/kova", "var/packages/Ferrox/etc"):
+            os.chmod(f"{self.root}/{closed}", 0o700)
+
+        def refused(code, sentence):
+            return {"success": False, "error": {"code": code, "msg": sentence}}
+
+        def engine(**answers):
+            daemon = FakeDaemon(self.root, "kovaelasticd", answers)
+            os.chmod(daemon.path, 0o666)
+            return daemon
+
+        hit = {"doc_id": "/v/photo/f", "share": "photo", "fields": {"KOVAMDFSSize": 5}}
+        out = {"share": "photos", "code": 1412, "reason": "62 %", "searched": False}
+        found = {"total": 3, "hits": [hit], "left_out": [], "next_offset": 2}
+        shares = success([{"share": "photo", "state": "ready"}, {"share": "photos", "state": "preparing", "percent": 62}])
+        rows = [  # words, the engine's answers, exit code, what is shown, the shares that the search was for
+            (["search", "x"], {"search": success(found)}, 0, "/v/photo/f\n.*3 found, 1 to 1 shown; more: --offset 2\n$", None),
+            (["search", "x"], {"search": success(dict(found, left_out=[out]))}, 4, "left out: share photos: 62 %", None),
+            (["search", "--share", "a", "--share", "b", "x"], {"search": success(found)}, 0, "", ["a", "b"]),
+            (["search", "--share", "a", "x"], {"search": refused(1404, 'there is no share "a" here')}, 3, 'no share "a"', ["a"]),
+            (["search", "--share", "photos", "x"], {"search": refused(1412, "it is being prepared, 62 %")}, 4, "62 %", ["photos"]),
+            (["search", "x"], {"search": refused(1406, "this is an instance of user ann")}, 5, "ctl: this is an instance", None),
+            (["search", "x"], {"search": refused(1414, "too many at work")}, 3, "too many at work", None),
+            (["search", "("], {"search": refused(1403, "character 1")}, 2, "character 1", None),
+            (["search", "--fresh", "x"], {"fresh": success({"behind": ["photos"]}), "shares": shares, "search": success(found)},
+             4, "left out: share photos: it may not", ["photo"]),
+            (["search", "--fresh", "--partial", "x"], {"fresh": success({"behind": ["photos"]}), "search": success(found)},
+             0, "only what is indexed by now: share photos", None),
+            (["search", "--fresh", "x"], {"fresh": refused(502, "gone")}, 4, "gone\nWithout --fresh", None),
+            (["show", "/v/f"], {"show": success({"document": {"KOVAMDPath": "/v/f", "KOVAMDTextContent": "deep"}})}, 0,
+             "^/v/f\n    size: 0 B\n    text: 4 B\n        deep\n$", None),
+            (["show", "/v/f"], {"show": refused(1405, '"/v/f" is not')}, 1, '^"/v/f" is not\n$', None),
+            (["status"], {"shares": shares}, 0, "share photo: can be searched\nshare photos: is being prepared, 62 %\n", None),
+        ]
+        for words, answers, code, text, asked_for in rows:
+            with self.subTest(words=words):
+                daemon = engine(**answers)
+                done = self.run_as_nobody(*words)
+                daemon.close()
+                self.assertEqual(code, done.returncode, done.stderr)
+                self.assertRegex((done.stdout + done.stderr).decode(), re.compile(text, re.S))
+                searches = [data for command, data in daemon.asked if command == "search"]
+                self.assertTrue(all("ids" not in data and data.get("shares") == asked_for for data in searches), searches)
 
     def test_completion_knows_commands_shares_folders_and_kinds(self):
         rows = [

@@ -1,0 +1,158 @@
+#include "cli/hits.h"
+
+#include <unistd.h>
+
+#include <cstdio>
+
+#include "cli/escape.h"
+#include "cli/format.h"
+#include "cli/output.h"
+#include "fileindex/elastic/elastic_control.h"
+#include "fileindex/util.h"
+#include "wire/fields.h"
+
+namespace ferrox::cli {
+
+namespace {
+
+namespace field = fileindex::elastic;
+
+/// Hits that one call shows: what fits on a screen, and the most that may be asked for.
+constexpr long long kLimitDefault = 10;
+constexpr long long kLimitMax = 1000;
+constexpr long long kOffsetMax = 1000000000;
+/// How long --fresh waits unless it says otherwise, and at most.
+constexpr long long kFreshSeconds = 30;
+constexpr long long kFreshSecondsMax = 600;
+/// What the engine puts around a match. Not shown: each becomes what the output can show.
+constexpr char kMarkStart = '\x02';
+constexpr char kMarkEnd = '\x03';
+
+/// The query as one text. The shell has taken one pair of quotes away: a phrase is given as '"a phrase"'.
+std::string JoinWords(const std::vector<std::string>& words) {
+  std::string query;
+  for (const std::string& word : words) query += (query.empty() ? "" : " ") + word;
+  return query;
+}
+
+/// In one word. What is no folder goes by its extension, as it does for the choice of what is read.
+std::string KindOf(const Json::Value& fields, const std::string& path) {
+  constexpr const char* kKinds[] = {"document", "audio", "video", "image", "other"};
+  if (BoolOf(fields, field::kKOVAMDIsDir)) return "folder";
+  return kKinds[fileindex::GetFileTypeByFullPath(path)];
+}
+
+/// A part of the text with the matches shown: bold on a terminal, in brackets elsewhere. The text comes from files and
+/// is escaped between the marks, so that no file can draw on the terminal.
+std::string ShowSnippet(const std::string& snippet, bool on_terminal) {
+  std::string shown;
+  std::string part;
+  for (const char byte : snippet + kMarkEnd) {
+    if (byte != kMarkStart && byte != kMarkEnd) {
+      part += byte;
+      continue;
+    }
+    shown += EscapeOneLine(part);
+    part.clear();
+    if (byte == kMarkStart) {
+      shown += on_terminal ? "\033[1m" : "[";
+    } else {
+      shown += on_terminal ? "\033[0m" : "]";
+    }
+  }
+  const size_t end = on_terminal ? 4 : 1;  // the mark that closed the last part
+  return shown.substr(0, shown.size() - end);
+}
+
+/// The path, what matched in the text, and a line of facts.
+void PrintHit(const Json::Value& hit, bool on_terminal) {
+  const Json::Value& fields = hit["fields"];
+  const std::string path = TextOf(hit, "doc_id");
+  const std::string shown = EscapeForTerminal(path);
+  (void)printf("%s\n", on_terminal ? ("\033[36m" + shown + "\033[0m").c_str() : shown.c_str());
+  const std::string snippet = TextOf(hit, "snippet");
+  if (!snippet.empty()) (void)printf("    %s\n", ShowSnippet(snippet, on_terminal).c_str());
+  (void)printf("    %s, %s, %s\n", KindOf(fields, path).c_str(), Size(IntOf(fields, field::kKOVAMDFSSize)).c_str(),
+               Date(IntOf(fields, field::kKOVAMDFSContentChangeDate)).c_str());
+}
+
+/// Whether hits follow behind those of this page. Of a user's page all may be gone that were to be shown: files that
+/// changed since they were indexed.
+bool HasMore(const Json::Value& result, uint64_t offset) {
+  return UintOf(result, "next_offset") > offset && offset + result["hits"].size() < UintOf(result, "total");
+}
+
+/// How many were found, which of them are shown, how long the engine took where it says so, and where more are.
+void PrintSummary(const Json::Value& result, uint64_t offset) {
+  const uint64_t total = UintOf(result, "total");
+  const auto shown = static_cast<uint64_t>(result["hits"].size());
+  (void)printf("%s found", Count(total).c_str());
+  if (shown < total && shown != 0)
+    (void)printf(", %s to %s shown", Count(offset + 1).c_str(), Count(offset + shown).c_str());
+  if (result.isMember("took_us")) (void)printf(", %.1f ms", static_cast<double>(UintOf(result, "took_us")) / 1000);
+  if (result["ranking_bounded"].asBool()) (void)printf("; so many match that only a part was ranked");
+  if (HasMore(result, offset)) (void)printf("; more: --offset %s", result["next_offset"].asString().c_str());
+  (void)printf("\n");
+}
+
+/// On standard error, with words of the index that are spelt alike.
+void PrintNothingFound(const Json::Value& result, bool complete) {
+  std::string similar;
+  for (const Json::Value& word : result["suggestions"]) {
+    if (word.isString()) similar += (similar.empty() ? "; there is: " : ", ") + EscapeForTerminal(word.asString());
+  }
+  (void)fprintf(stderr, "%s%s\n", complete ? "nothing found" : "no hit in what was searched", similar.c_str());
+}
+
+}  // namespace
+
+Json::Value SearchMembers(const Arguments& arguments) {
+  Json::Value data;
+  data["query"] = JoinWords(arguments.words);
+  data["limit"] = Json::Int64(arguments.Number("--limit", kLimitDefault, 1, kLimitMax));
+  data["offset"] = Json::Int64(arguments.Number("--offset", 0, 0, kOffsetMax));
+  data["sort"] = arguments.Get("--sort", "relevance");
+  data["snippet"] = true;
+  const bool json = arguments.Has("--json");
+  data["mark_start"] = json ? "[" : std::string(1, kMarkStart);
+  data["mark_end"] = json ? "]" : std::string(1, kMarkEnd);
+  return data;
+}
+
+std::chrono::seconds FreshWait(const Arguments& arguments) {
+  const bool given = !arguments.Get("--fresh").empty();
+  return std::chrono::seconds(given ? arguments.Number("--fresh", 0, 0, kFreshSecondsMax) : kFreshSeconds);
+}
+
+Json::Value NothingSearched() {
+  Json::Value nothing;
+  nothing["total"] = 0;
+  nothing["hits"] = Json::Value(Json::arrayValue);
+  return nothing;
+}
+
+int PrintFound(const Arguments& arguments, Found found) {
+  Json::Value& result = found.result;
+  result["left_out"] = found.left_out.ToJson();
+  if (!found.not_noticed.empty()) result["not_noticed"] = found.not_noticed;
+  const uint64_t hits = result["hits"].isArray() ? result["hits"].size() : 0;
+  const auto offset = static_cast<uint64_t>(arguments.Number("--offset", 0, 0, kOffsetMax));
+  if (arguments.Has("--json")) {
+    PrintJson(result);
+  } else if (hits > 0 || HasMore(result, offset)) {
+    const bool on_terminal = isatty(STDOUT_FILENO) == 1;
+    for (const Json::Value& hit : result["hits"]) PrintHit(hit, on_terminal);
+    PrintSummary(result, offset);
+  } else if (found.searched) {
+    PrintNothingFound(result, found.left_out.Empty());
+  }
+  (void)fflush(stdout);
+  if (!found.not_noticed.empty()) Warn(found.not_noticed);
+  found.left_out.Warn();
+  const bool partial = arguments.Has("--partial");
+  if (found.stale && !partial) (void)fprintf(stderr, "%s\n", kWithoutFresh);
+  if (!found.left_out.Empty() && !partial) return kIncomplete;
+  return hits > 0 ? kDone : kNothingFound;
+}
+
+}  // namespace ferrox::cli
