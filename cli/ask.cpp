@@ -36,6 +36,7 @@ constexpr Daemon kEngine = {"the search engine", kElasticdSocket, Error::kEngine
 constexpr Daemon kIndexDaemon = {"the index daemon", kFileIndexdSocket, Error::kInternal};
 constexpr Daemon kNotificationDaemon = {"the notification daemon", kNotifydSocket, Error::kInternal};
 constexpr Daemon kContentExtraction = {"content extraction", kContentExtractdSocket, Error::kInternal};
+constexpr Daemon kAccessCheck = {"the access check", kAccessSocket, Error::kInternal};
 
 /// Of a daemon that took the connection and let the time pass.
 constexpr char kNoAnswer[] = "does not answer; see its log, or restart it ('fileindexctl down', 'up')";
@@ -134,11 +135,13 @@ InstanceState AskAll() {
   auto index_daemon = ask(kIndexDaemon);
   auto notification_daemon = ask(kNotificationDaemon);
   auto content_extraction = ask(kContentExtraction);
+  auto access_check = ask(kAccessCheck);
   InstanceState state;
   state.engine = EngineState();
   state.index_daemon = index_daemon.get();
   state.notification_daemon = notification_daemon.get();
   state.content_extraction = content_extraction.get();
+  state.access_check = access_check.get();
   return state;
 }
 

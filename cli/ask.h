@@ -31,12 +31,13 @@ struct DaemonState {
   Json::Value status;   ///< its reply; null when there is none
   std::string problem;  ///< why it runs and there is no reply, with the remedy
 };
-/// The same of all four.
+/// The same of all.
 struct InstanceState {
   DaemonState engine;
   DaemonState index_daemon;
   DaemonState notification_daemon;
   DaemonState content_extraction;
+  DaemonState access_check;
 };
 /// Asks all daemons at once and waits for each at most 5 s, so that one that hangs hides nothing of the others.
 /// @throws NotPermitted.

@@ -1,5 +1,9 @@
+#include <algorithm>
 #include <cstdio>
 #include <cstdlib>
+#include <iterator>
+#include <string_view>
+#include <vector>
 
 #include <kova/service.h>
 
@@ -14,6 +18,7 @@
 #include "fileindex/status_mgr.h"
 #include "platform/host/child_service.h"
 #include "services/support/daemon.h"
+#include "services/support/instance_owner.h"
 
 /// Starting and stopping the daemons, and pausing what they do. Where the host has a service manager it does the work;
 /// elsewhere the daemons are children of the tool's, and a supervisor starts again what was killed.
@@ -30,16 +35,27 @@ struct Service {
   int option;
 };
 
+constexpr char kAccess[] = "kova-access";
+
 /// In the order in which they start: the index daemon needs the engine and content extraction, and reads the queues
 /// that the notification daemon fills.
 constexpr Service kServices[] = {
     {"kovaelasticd", "search engine", &KLIBServiceStart, &KLIBServiceStop, 1},
+    {kAccess, "access check", &KLIBServiceStart, &KLIBServiceStop, 1},
     {"kovacontentextractd", "content extraction", &KLIBServiceStart, &KLIBServiceStop, 1},
     {"kovanotifyd", "notification daemon", &KLIBServiceStart, &KLIBServiceStop, 1},
     {"pkg-Ferrox-fileindexd", "index daemon", &KLIBServicectlStart, &KLIBServicectlStop, KLIB_SERVICECTL_UPSTART},
 };
 
 constexpr Service kSupervisor = {"fileindex-supervisor", "supervisor", nullptr, nullptr, 0};
+
+/// The daemons of this instance. One that is not root's has no users whose access there is to check.
+std::vector<Service> Services() {
+  std::vector<Service> services(std::begin(kServices), std::end(kServices));
+  if (!services::IsRootsInstance())
+    std::erase_if(services, [](const Service& one) { return std::string_view(one.name) == kAccess; });
+  return services;
+}
 
 /// The platform says only that it failed; the host keeps why.
 [[noreturn]] void ThrowProblem(const Service& service, const char* what) {
@@ -86,7 +102,7 @@ int ReportPause(void (*change)(int hours), int hours, const std::string& report)
 int RunUp(const Arguments& arguments) {
   services::GuardLockFiles();
   if (arguments.Has("--no-supervisor")) StopSupervisor();
-  for (const Service& service : kServices) {
+  for (const Service& service : Services()) {
     const bool ran = KLIBServiceIsRunning(service.name) == 1;
     if (service.start(service.name, service.option) < 0) ThrowProblem(service, "started");
     (void)printf("%s: %s\n", service.label, ran ? "runs already" : "started");
@@ -98,8 +114,9 @@ int RunUp(const Arguments& arguments) {
 /// In the opposite order, so that each stops while those that it needs still answer.
 int RunDown(const Arguments&) {
   StopSupervisor();  // first, or it would start them again
-  for (size_t i = std::size(kServices); i-- > 0;) {
-    const Service& service = kServices[i];
+  std::vector<Service> services = Services();
+  std::reverse(services.begin(), services.end());
+  for (const Service& service : services) {
     const bool ran = KLIBServiceIsRunning(service.name) == 1;
     if (service.stop(service.name, service.option) < 0) ThrowProblem(service, "stopped");
     (void)printf("%s: %s\n", service.label, ran ? "stopped" : "does not run");
@@ -112,7 +129,7 @@ int RunPrepare(const Arguments&) {
   services::GuardLockFiles();
   fileindex::PrepareServices();
   if (!fileindex::FolderMgr().GetFolders().empty()) (void)KLIBServiceStart("kovanotifyd", 1);
-  for (const Service& service : kServices) {
+  for (const Service& service : Services()) {
     (void)printf("%s: %s\n", service.label, KLIBServiceIsRunning(service.name) == 1 ? "runs" : "does not run");
   }
   return kDone;

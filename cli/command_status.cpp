@@ -12,8 +12,9 @@
 #include "fileindex/folders/folder_mgr.h"
 #include "platform/host/child_service.h"
 #include "platform/host/share_table.h"
+#include "services/support/instance_owner.h"
 
-/// The state of the whole instance: the four daemons, the supervisor, and each share with indexed folders. Nothing here
+/// The state of the whole instance: the daemons, the supervisor, and each share with indexed folders. Nothing here
 /// changes anything, and nothing that is broken hides the rest: each part is asked for by itself, and what is wrong
 /// with one takes the place of its state.
 namespace ferrox::cli {
@@ -76,6 +77,15 @@ std::string DaemonText(const Json::Value& daemon, bool needed) {
          " workers" + PauseText(daemon);
 }
 
+/// Folders of shares whose file system does not answer, each in a line of its own.
+std::string UnresponsiveText(const Json::Value& daemon) {
+  std::string text;
+  for (const Json::Value& root : daemon["unresponsive"]) {
+    if (root.isString()) text += "\n    its file system does not answer: " + EscapeForTerminal(root.asString());
+  }
+  return text;
+}
+
 /// What of the workers' sandbox the kernel lacks is worth knowing.
 std::string ContentExtractionText(const Json::Value& daemon) {
   if (!daemon.isObject()) return "does not run; it starts with the first file whose content is wanted";
@@ -88,14 +98,18 @@ std::string ContentExtractionText(const Json::Value& daemon) {
     if (piece.isString())
       text += "\n    the workers lack a protection on this system: " + EscapeForTerminal(piece.asString());
   }
-  for (const Json::Value& root : daemon["unresponsive"]) {
-    if (root.isString()) text += "\n    its file system does not answer: " + EscapeForTerminal(root.asString());
-  }
+  text += UnresponsiveText(daemon);
   for (const Json::Value& program : daemon["not_installed"]) {
     if (program.isString())
       text += "\n    not installed: " + EscapeForTerminal(program.asString()) + "; what it reads is found by name only";
   }
   return text;
+}
+
+/// Only an instance of root's has users whose access is checked.
+std::string AccessCheckText(const Json::Value& daemon) {
+  if (!daemon.isObject()) return std::string(kStopped) + "; until then only root finds anything";
+  return "runs, process " + std::to_string(IntOf(daemon, "pid")) + UnresponsiveText(daemon);
 }
 
 /// Null where there is none, and systemd does its work.
@@ -147,10 +161,12 @@ Report Gather() {
 /// Content extraction starts by itself when it is needed, so that it may be stopped.
 int ExitCodeOf(const Report& report) {
   if (!report.folders_problem.empty() || !report.table_problem.empty()) return kFailure;
-  const bool is_stopped = report.has_folders && (report.IndexDaemon().isNull() || report.NotificationDaemon().isNull());
+  const bool is_unchecked = services::IsRootsInstance() && report.state.access_check.status.isNull();
+  const bool is_stopped =
+      report.has_folders && (report.IndexDaemon().isNull() || report.NotificationDaemon().isNull() || is_unchecked);
   if (is_stopped || report.state.engine.status.isNull()) return kFailure;
   for (const DaemonState* daemon : {&report.state.engine, &report.state.index_daemon, &report.state.notification_daemon,
-                                    &report.state.content_extraction}) {
+                                    &report.state.content_extraction, &report.state.access_check}) {
     if (!daemon->problem.empty()) return kFailure;
   }
   return kDone;
@@ -163,6 +179,7 @@ void PrintAsJson(const Report& report) {
   json["index_daemon"] = StatusJson(report.state.index_daemon);
   json["notification_daemon"] = StatusJson(report.state.notification_daemon);
   json["content_extraction"] = StatusJson(report.state.content_extraction);
+  json["access_check"] = StatusJson(report.state.access_check);
   json["supervisor"] = SupervisorJson();
   json["resting_shares"] = report.resting;
   const std::string& problem = report.folders_problem.empty() ? report.table_problem : report.folders_problem;
@@ -180,6 +197,9 @@ void PrintDaemons(const Report& report) {
               NotificationDaemonText(report.NotificationDaemon(), needed));
   PrintDaemon("content extraction", report.state.content_extraction,
               ContentExtractionText(report.state.content_extraction.status));
+  if (services::IsRootsInstance()) {
+    PrintDaemon("access check", report.state.access_check, AccessCheckText(report.state.access_check.status));
+  }
   PrintSupervisor();
 }
 

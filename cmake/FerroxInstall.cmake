@@ -44,7 +44,7 @@ install(FILES ${CMAKE_SOURCE_DIR}/packaging/completions/_fileindexctl
 
 # systemd looks for units and tmpfiles below "lib", whatever the folder of the libraries is called. The units name the
 # programs with the prefix that is given when they are installed.
-set(units kovaelasticd kovanotifyd kovacontentextractd fileindexd fileindex-prepare)
+set(units kovaelasticd kova-access kovanotifyd kovacontentextractd fileindexd fileindex-prepare)
 install(CODE "
   set(bin_folder \${CMAKE_INSTALL_PREFIX}/${CMAKE_INSTALL_BINDIR})
   set(sbin_folder \${CMAKE_INSTALL_PREFIX}/${CMAKE_INSTALL_SBINDIR})

@@ -18,6 +18,7 @@ constexpr ServiceRow kServices[] = {
     {"kovaelasticd", "kovaelasticd", "/var/run/kovaelasticd.sock", "kovaelasticd.service"},
     {"pkg-Ferrox-fileindexd", "fileindexd", "/var/run/fileindexd.sock", "fileindexd.service"},
     {"kovanotifyd", "kovanotifyd", "/var/run/kovanotifyd.sock", "kovanotifyd.service"},
+    {"kova-access", "kova-access", "/var/run/kova-access.sock", "kova-access.service"},
     {"kovacontentextractd", "kovacontentextractd", "/var/run/kovacontentextractd.sock", "kovacontentextractd.service"},
 };
 /// The file-sharing service is the host's own; an instance cannot switch it.

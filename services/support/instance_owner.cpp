@@ -40,8 +40,10 @@ std::optional<uid_t> InstanceOwner() {
   return status.st_uid;
 }
 
+bool IsRootsInstance() { return InstanceOwner().value_or(geteuid()) == 0; }
+
 void ClosePrivateFolders() {
-  if (geteuid() != 0 || InstanceOwner() != std::optional<uid_t>(0)) return;
+  if (geteuid() != 0 || !IsRootsInstance()) return;
   for (const char* folder : kPrivateFolders) {
     const std::string path = InstancePath(folder);
     if (!MakePrivate(path)) {

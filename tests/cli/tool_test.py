@@ -276,10 +276,12 @@ class ToolTest(unittest.TestCase):
         shares = [{"share": "photo", "path": "/v/photo", "state": "idle", "failures": {}}]
         answering = {"kovaelasticd": {"ping": success({"pid": 4})}, "kovanotifyd": {"status": success({"pid": 6, "queues": []})},
                      "fileindexd": {"status": success({"pid": 5, "workers": 2, "paused": False, "shares": shares})},
-                     "kovacontentextractd": {"status": success({"pid": 7})}}
+                     "kovacontentextractd": {"status": success({"pid": 7})}, "kova-access": {"status": success({"pid": 8})}}
         places = {"kovaelasticd": ("engine", "search engine"), "fileindexd": ("index_daemon", "index daemon"),
                   "kovanotifyd": ("notification_daemon", "notification daemon"),
                   "kovacontentextractd": ("content_extraction", "content extraction")}
+        if os.geteuid() == 0:
+            places["kova-access"] = ("access_check", "access check")
         for hung_names in (["kovanotifyd"], list(places)):
             daemons = [HungDaemon(self.root, name, {}) if name in hung_names else FakeDaemon(self.root, name, answers)
                        for name, answers in answering.items()]
@@ -316,6 +318,7 @@ class ToolTest(unittest.TestCase):
     def test_what_a_daemon_says_makes_the_exit_code(self):
         refusal = {"success": False, "error": {"code": 1403, "msg": "query, character 1: no"}}
         engine = self.daemon("kovaelasticd", ping=success({"pid": 4}), search=refusal)
+        self.daemon("kova-access", status=success({"pid": 8}))
         self.assertEqual((2, True), ((done := self.run_tool("search", "(")).returncode, b"character 1" in done.stderr))
         for folder in ("var/lib/kova/fileindex/queue", "tmp"):
             os.makedirs(f"{self.root}/{folder}")
@@ -399,7 +402,7 @@ class ToolTest(unittest.TestCase):
         queue, words = f"{self.root}/queue", {"SHARE": "photo", "PATH": "/photo/trip", "NEW_NAME": "new"}
         write_json(queue, {})
         os.chmod(queue, 0o600)
-        for name in ("kovaelasticd", "kovanotifyd", "fileindexd", "kovacontentextractd"):
+        for name in ("kovaelasticd", "kovanotifyd", "fileindexd", "kovacontentextractd", "kova-access"):
             os.chmod(self.daemon(name).path, 0o600)
         before = contents()
         for mode in (0o755, 0o700):

@@ -17,17 +17,17 @@ cat >"$system/walk" <<'WALK'
 #!/bin/bash
 trap 'systemctl poweroff --no-block' EXIT
 set -eux
-expect() { [[ "$(systemctl is-active kovaelasticd.service kovanotifyd.service fileindexd.service | tr '\n' ' ')" == "$* " ]]; }
+expect() { [[ "$(systemctl is-active kovaelasticd.service kova-access.service kovanotifyd.service fileindexd.service | tr '\n' ' ')" == "$* " ]]; }
 finds() { for _ in {1..50}; do fileindexctl search "$1" && return; sleep 0.1; done; false; }
 if [[ ! -e /srv/docs ]]; then
   mkdir -p /srv/docs
   echo lantern >/srv/docs/a.txt
   sleep 1
-  expect active active inactive
+  expect active active active inactive
   [[ -e /tmp/ferrox_cfg_folder.lock ]]
   fileindexctl up
   fileindexctl share add /srv/docs
-  expect active active active
+  expect active active active active
   finds lantern
   echo lighthouse >/srv/docs/b.txt
   finds lighthouse
@@ -36,14 +36,14 @@ if [[ ! -e /srv/docs ]]; then
   ! fileindexctl status | grep "lack a protection"
   systemctl kill -s KILL fileindexd.service
   sleep 3
-  expect active active active
+  expect active active active active
   fileindexctl folder delete /docs
-  expect active active inactive
+  expect active active active inactive
   fileindexctl folder add /docs
-  expect active active active
+  expect active active active active
   echo "first boot done"
 else
-  expect active active active
+  expect active active active active
   finds lantern
   systemctl stop kovacontentextractd.service
   echo beacon >/srv/docs/c.txt
@@ -52,7 +52,7 @@ else
   fileindexctl status
   fileindexctl down
   [[ "$(systemctl is-active kovacontentextractd.service)" == inactive ]]
-  expect inactive inactive inactive
+  expect inactive inactive inactive inactive
   echo "second boot done"
 fi
 WALK
