@@ -206,6 +206,8 @@ TEST_F(TrimmingTest, RepliesAreAFunctionOfWhatTheAskerMayRead) {
     }
   }
   EXPECT_EQ(0, Ask(changed.store, "secret").total);
+  const SearchReply near = Ask(changed.store, "bridgse");
+  EXPECT_EQ(near.suggestions, (std::vector<std::string>{"bridge", "bridges"}));
   EXPECT_GT(Find(changed.store, "secret").total, 500);
 }
 

@@ -50,9 +50,10 @@ SearchReply Searcher::Run() {
                                                ? OrderByRelevance(documents, evaluator.Words(), reply)
                                                : ColumnOrder(reader_, visible_, request_).Page(documents, reply.total);
   for (const RankedDocument& ranked : page) reply.hits.push_back(LoadHit(ranked, evaluator.Words()));
-  // What is suggested is drawn from the documents of all.
-  if (reply.total == 0 && !visible_.IsForAsker()) {
-    reply.suggestions = Suggest(reader_.database, evaluator.Words().looked_for);
+  if (reply.total == 0) {
+    const std::vector<std::string>& words = evaluator.Words().looked_for;
+    reply.suggestions =
+        visible_.IsForAsker() ? SuggestVisible(reader_.database, words, visible_) : Suggest(reader_.database, words);
   }
   return reply;
 }

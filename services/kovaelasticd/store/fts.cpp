@@ -170,7 +170,7 @@ fts5_api* FullTextApi(Database& database) {
 
 /// What is kept for an asker at the end does not depend on when this was called, nor on the order of the hits.
 void HitCollector::Shorten() {
-  if (hits_.size() <= hits_max_ || hits_max_ == 0) return;
+  if (hits_.size() <= hits_max_) return;
   if (!visible_.IsForAsker()) {
     hits_.erase(hits_.begin(), hits_.end() - static_cast<ptrdiff_t>(hits_max_));
     return;

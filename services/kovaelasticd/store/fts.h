@@ -28,17 +28,21 @@ constexpr uint8_t kCountMax = 32;
 /// one by one, with their counts: those added to the index last; for an asker those with the least PathKeys.
 class HitCollector {
  public:
-  /// `visible` must outlive this.
+  /// `visible` must outlive this. `hits_max` may be 0.
   HitCollector(size_t hits_max, const Visible& visible)
       : hits_max_(hits_max), shorten_at_(2 * hits_max), visible_(visible) {}
   /// Documents come in ascending order, phrase by phrase.
   void Add(int64_t id, uint8_t count, uint8_t places) {
+    ++seen_;
     if (!visible_.Contains(id)) return;
     set_.Add(id);
+    if (hits_max_ == 0) return;
     if (hits_.size() >= shorten_at_) Shorten();
     hits_.push_back({static_cast<uint32_t>(id), count, places});
   }
   const DocSet& Set() const { return set_; }
+  /// How often Add was called: the work that it was.
+  size_t Seen() const { return seen_; }
   DocSet TakeSet() { return std::move(set_); }
   /// In ascending order of documents; those of several phrases follow each other.
   std::vector<WordHit> TakeHits();
@@ -48,6 +52,7 @@ class HitCollector {
 
   const size_t hits_max_;
   size_t shorten_at_;
+  size_t seen_ = 0;
   const Visible& visible_;
   DocSet set_;
   std::vector<WordHit> hits_;

@@ -20,6 +20,7 @@ StoreReader::StoreReader(const std::string& path, HiddenDocuments& hidden_docume
       hidden_documents_(hidden_documents) {
   database.Execute("PRAGMA cache_size = -8192");
   RegisterFullText(database);
+  database.Execute("CREATE VIRTUAL TABLE temp.content_terms USING fts5vocab('main', 'content_fts', 'instance')");
   database.Execute("CREATE VIRTUAL TABLE temp.meta_terms USING fts5vocab('main', 'meta_fts', 'instance')");
   database.Execute("PRAGMA query_only = 1");
 }
