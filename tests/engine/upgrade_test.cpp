@@ -67,6 +67,24 @@ class UpgradeTest : public EngineTest {
   const std::string file_ = IndexFile(folder_ / "a");
 };
 
+TEST_F(UpgradeTest, OrdinaryUsersAreToldToWaitUntilTheRightsAreRecorded) {
+  engine_.reset();
+  engine_ = std::make_unique<Engine>(folder_ / "state", [](const Asker&, const std::vector<std::string>& paths) {
+    return std::vector<wire::LiveFile>(paths.size(), {true, true, true, ""});
+  });
+  ASSERT_EQ(Create("a", "a"), 0);
+  ASSERT_EQ(Code("index_share", R"({"id":"a","share":"photo","root":"/v/photo"})"), 0);
+  const char* const search = R"({"command":"search","data":{"query":"boats","shares":["photo"]}})";
+  while (Send("index_stat", R"({"id":"a"})")["data"].isMember("upgrading")) {
+    const int code = CodeOf(SendText(search, 54321));
+    EXPECT_EQ(code, 1412);
+  }
+  const Json::Value reply = SendText(search, 54321);
+  EXPECT_EQ(reply["error"]["msg"], "the index of this share is being prepared, 0 %") << toString(reply);
+  EXPECT_EQ(Code("index_prepared", R"({"id":"a"})"), 0);
+  EXPECT_EQ(SendText(search, 54321)["data"]["total"], 0) << "what has no access record is closed";
+}
+
 TEST_F(UpgradeTest, AFileOfFormat2AnswersAsBeforeWhetherItsWordsAreTakenOverOrCutAgain) {
   for (const bool cut_words : {false, true}) {
     SCOPED_TRACE(cut_words);

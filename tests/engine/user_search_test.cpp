@@ -166,5 +166,35 @@ TEST_F(UserSearchTest, HitsThatAreNoLongerSoOnTheDiskAreDroppedAndThePageFilled)
   EXPECT_EQ(Search("", "name:d")["data"]["total"], 0);
 }
 
+TEST_F(UserSearchTest, OneDocumentIsShownOrNothingIsSaidOfIt) {
+  PutShare("open", 2);
+  PutShare("other", 1);
+  const auto show = [this](const std::string& path) {
+    return engine_->Handle(R"({"command":"show","data":{"text":true,"path":")" + path + "\"}}", {kUser, 100, 1});
+  };
+  const std::string shown = show("/v/open/f1000");
+  EXPECT_NE(shown.find("common words"), std::string::npos);
+  EXPECT_EQ(shown.find("\"_KOVA"), std::string::npos);
+  EXPECT_EQ(show("/open/f1000"), shown);
+  EXPECT_EQ(toString(Send("show", R"({"text":true,"path":"/open/f1000"})")) + "\n", shown + "\n");
+  EXPECT_EQ(Code("show", R"({"path":"/open/f1009"})"), 1405);
+  EXPECT_EQ(show("/open/f1001").find("1405"), std::string::npos);
+  const auto refused = [&show](const std::string& path) {
+    std::string text = show(path);
+    EXPECT_NE(text.find("1405"), std::string::npos) << text;
+    return text.replace(text.find(path), path.size(), "PATH");
+  };
+  closed_ = {"/v/open/f1000", "/v/other"};
+  stamps_["/v/open/f1001"] = "5.1.3.77";
+  Json::Value unrecorded;
+  unrecorded["_KOVAStamp"] = kStamp;
+  ASSERT_EQ(CodeOf(SendText(toString(wire::UpsertDocumentRequest("open", "/v/open/unrecorded", unrecorded)))), 0);
+  const std::string reply = refused("/v/none");
+  for (const char* path : {"/v/open/f1000", "/v/open/f1001", "/v/open/unrecorded", "/open/none", "/v/other/f1000",
+                           "/other/f1000", "/other", "/v/openf1000", "/"}) {
+    EXPECT_EQ(refused(path), reply) << path;
+  }
+}
+
 }  // namespace
 }  // namespace ferrox::engine

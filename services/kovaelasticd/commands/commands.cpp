@@ -31,6 +31,7 @@ constexpr Command kOtherCommands[] = {{"access_set", &RunAccessSet, Users::kPriv
                                       {"commit", &OnCommit, Users::kPrivileged},
                                       {"update_term_suggestion", &OnUpdateTermSuggestion, Users::kPrivileged},
                                       {"search", &RunSearch, Users::kEveryone},
+                                      {"show", &RunShow, Users::kEveryone},
                                       {"ping", &OnPing, Users::kEveryone}};
 
 }  // namespace

@@ -65,6 +65,8 @@ std::span<const Command> DocumentCommands();  ///< document_commands.cpp
 Json::Value RunAccessSet(CommandCall& call);
 /// The command "search" (search_command.cpp).
 Json::Value RunSearch(CommandCall& call);
+/// The command "show" (show_command.cpp).
+Json::Value RunShow(CommandCall& call);
 
 /// {"success":false,"error":{"code":...,"msg":...}}
 Json::Value FailureReply(int code, const std::string& sentence);

@@ -1,5 +1,6 @@
 #include "services/kovaelasticd/commands/user_search.h"
 
+#include <optional>
 #include <string>
 #include <utility>
 #include <vector>
@@ -63,9 +64,12 @@ Json::Value UserHitJson(const UserScope& scope, const IndexHit& found) {
   return hit;
 }
 
-std::string PreparingSentence(const UpgradeProgress& progress) {
-  const int64_t percent = progress.of == 0 ? 0 : progress.done * 100 / progress.of;
-  return "the index of this share is being prepared, " + std::to_string(percent) + " %";
+/// How much of an index that is being upgraded, or given access records, is done, of a hundred; nothing when neither.
+/// An upgrade may end in between: what follows it is asked for last.
+std::optional<int64_t> PreparedPercent(Index& index) {
+  const std::optional<UpgradeProgress> upgrade = index.Upgrading();
+  if (upgrade.has_value()) return upgrade->of == 0 ? 0 : upgrade->done * 100 / upgrade->of;
+  return index.PreparingPercent();
 }
 
 }  // namespace
@@ -84,8 +88,9 @@ Registry::OpenIndex OpenForUser(const CommandCall& call, const EnteredShare& sha
   Registry::OpenIndex open = call.registry.Open(share.index_id);
   // Between the list and now, the index may have become another share's.
   if (open.share == nullptr || !(*open.share == *share.note)) RefuseShare(share.note->share);
-  if (const std::optional<UpgradeProgress> progress = open.index->Upgrading(); progress.has_value()) {
-    throw UserError(Error::kEngineIndexPreparing, PreparingSentence(*progress));
+  if (const std::optional<int64_t> percent = PreparedPercent(*open.index); percent.has_value()) {
+    throw UserError(Error::kEngineIndexPreparing,
+                    "the index of this share is being prepared, " + std::to_string(*percent) + " %");
   }
   return open;
 }
