@@ -9,6 +9,7 @@
 #include "cli/format.h"
 #include "cli/left_out.h"
 #include "cli/output.h"
+#include "cli/user_commands.h"
 #include "common/file_util.h"
 #include "fileindex/elastic/elastic_control.h"
 #include "fileindex/folders/folder_mgr.h"
@@ -117,6 +118,7 @@ uint64_t ListLeftOut(const Json::Value& daemon, const std::string& share, bool j
 
 /// All files are shown, also behind one that is not in the index.
 int RunShow(const Arguments& arguments) {
+  if (arguments.Has("--as")) return RunUserShow(arguments);
   bool all = true;
   LeftOut left_out;
   for (const std::string& file : arguments.words) all = Show(file, arguments, left_out) && all;

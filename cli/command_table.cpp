@@ -11,9 +11,10 @@ namespace {
 /// Options of several commands.
 const Option kJson = {"--json", nullptr, "one line of JSON for scripts"};
 const Option kAccounts = {"--accounts", "local|domain|ldap", "whose homes (default local)"};
+const Option kAs = {"--as", "USER", "what this user finds, for root; one without account as UID:GID,..."};
 const Option kName = {"--name", "NAME", "what people call it (default: the last part of the path)"};
 
-CommandGroup Services() {
+CommandGroup ServiceCommands() {
   return {"The service",
           {
               {"up",
@@ -53,6 +54,7 @@ CommandGroup Searching() {
           {"search",
            "QUERY...",
            {{"--share", "SHARE", "search in this share only; may be given several times"},
+            kAs,
             {"--limit", "N", "show at most so many hits (default 10, at most 1000)"},
             {"--offset", "N", "leave out the first N hits"},
             {"--sort", "relevance|date|name|size", "the order (default: relevance)"},
@@ -236,7 +238,7 @@ CommandGroup Inspection() {
           {
               {"show",
                "FILE...",
-               {{"--text", nullptr, "its text alone, whole"}, {"--json", nullptr, "one JSON object a line"}},
+               {kAs, {"--text", nullptr, "its text alone, whole"}, {"--json", nullptr, "one JSON object a line"}},
                "Shows what the index holds of a file: what was read, by which reader, all fields, and the text's "
                "beginning.",
                &RunShow,
@@ -266,7 +268,7 @@ std::vector<Command> Joined(std::vector<Command> first, const std::vector<Comman
 }  // namespace
 
 const std::vector<CommandGroup>& CommandTable() {
-  static const std::vector<CommandGroup> table = {Services(),
+  static const std::vector<CommandGroup> table = {ServiceCommands(),
                                                   Searching(),
                                                   {"What is indexed", Joined(FolderCommands(), IndexCommands())},
                                                   {"Shares", Joined(ShareTableCommands(), ShareStateCommands())},

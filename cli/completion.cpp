@@ -74,6 +74,7 @@ Words Candidates(std::string name, const std::string& typed) {
   if (name == "PATH") return SharePaths(typed);
   if (name == "KINDS") return KindLists(typed);
   if (name == "FILE") return {":files"};
+  if (name == "USER") return {":users"};
   if (name == "FOLDER" || name == "NEW_FOLDER" || name == "MOUNT_POINT") return {":folders"};
   return {};
 }

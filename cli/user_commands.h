@@ -6,7 +6,7 @@
 /// may read (docs/formats/engine.md, Ordinary users). Of files of the service nothing is read.
 namespace ferrox::cli {
 
-/// Also for "search --as USER" of root and the instance's owner.
+/// With --as, for root and the instance's owner: what that user would find and see, and of a file why not.
 int RunUserSearch(const Arguments& arguments);
 int RunUserShow(const Arguments& arguments);
 int RunUserStatus(const Arguments& arguments);

@@ -1,14 +1,18 @@
 #include <cstdio>
+#include <optional>
 
+#include "cli/as_user.h"
 #include "cli/ask.h"
 #include "cli/document.h"
 #include "cli/escape.h"
+#include "cli/explain_access.h"
 #include "cli/folder_path.h"
 #include "cli/format.h"
-#include "cli/left_out.h"
 #include "cli/output.h"
 #include "cli/user_commands.h"
 #include "common/error.h"
+#include "fileindex/folders/folder_mgr.h"
+#include "fileindex/util.h"
 #include "wire/engine_requests.h"
 #include "wire/fields.h"
 
@@ -16,44 +20,63 @@ namespace ferrox::cli {
 
 namespace {
 
-/// Which of several files a share is of, the engine finds out. @return whether the user may know of it.
-bool ShowForUser(const std::string& file, const Arguments& arguments, LeftOut& left_out) try {
+/// The reply of "show". Which share a path is of, the engine finds out.
+Json::Value AskForDocument(const std::string& path, const std::optional<AskedUser>& user) {
   Json::Value data;
-  data["path"] = AbsolutePath(file);
+  data["path"] = path;
   data["text"] = true;
-  const Json::Value document = AskEngine(wire::EngineRequest("show", data))["document"];
+  if (user.has_value()) data["as"] = ToJson(*user);
+  return AskEngine(wire::EngineRequest("show", data))["document"];
+}
+
+void PrintForUser(Json::Value document, const Arguments& arguments) {
   const std::string text = TextOf(document, fileindex::elastic::kKOVAMDTextContent);
   if (arguments.Has("--text")) {
     PrintWholeText(text);
   } else if (arguments.Has("--json")) {
     PrintJson(document);
   } else {
-    Json::Value fields = document;
-    fields.removeMember(fileindex::elastic::kKOVAMDTextContent);
-    PrintDocument(fields, text, Fields::kPublic);
+    document.removeMember(fileindex::elastic::kKOVAMDTextContent);
+    PrintDocument(document, text, Fields::kPublic);
   }
+}
+
+/// Of another user than the caller it is told why nothing is shown; what a user may not read, that user is not told.
+void TellNotShown(const std::string& path, const std::string& sentence, const std::optional<AskedUser>& user,
+                  bool json) {
+  if (user.has_value()) {
+    PrintWhyNotShown(path, fileindex::GetShareNameByPath(ToSharePath(path, fileindex::FolderMgr())), *user, json);
+  } else {
+    (void)fprintf(stderr, "%s\n", EscapeForTerminal(sentence).c_str());
+  }
+}
+
+/// @return whether the user is shown the file.
+bool ShowForUser(const std::string& path, const Arguments& arguments, const std::optional<AskedUser>& user) try {
+  PrintForUser(AskForDocument(path, user), arguments);
   return true;
 } catch (const Refusal& refusal) {
   if (refusal.Code() == Error::kEngineBadRequest) throw UsageError(EscapeForTerminal(refusal.Reason()));
-  if (refusal.Code() == Error::kEngineNoSuchDocument) {
-    (void)fprintf(stderr, "%s\n", EscapeForTerminal(refusal.Reason()).c_str());
-  } else if (refusal.Code() == Error::kEngineRightsUnknown || refusal.Code() == Error::kEngineUserBusy) {
-    throw Failure(refusal.Reason());
-  } else {
-    left_out.AddForUser("", refusal.Code(), refusal.Reason());
-  }
+  if (refusal.Code() != Error::kEngineNoSuchDocument) throw Failure(refusal.Reason());
+  TellNotShown(path, refusal.Reason(), user, arguments.Has("--json"));
   return false;
+}
+
+/// The full path of what root means by a word.
+std::string FullPathOf(const std::string& file) {
+  return fileindex::GetFullPath(ToSharePath(file, fileindex::FolderMgr()));
 }
 
 }  // namespace
 
 /// All files are shown, also behind one that is not in the index.
 int RunUserShow(const Arguments& arguments) {
+  std::optional<AskedUser> user;
+  if (arguments.Has("--as")) user = UserOf(arguments);
   bool all = true;
-  LeftOut left_out;
-  for (const std::string& file : arguments.words) all = ShowForUser(file, arguments, left_out) && all;
-  left_out.Warn();
-  if (!left_out.Empty()) return kIncomplete;
+  for (const std::string& file : arguments.words) {
+    all = ShowForUser(user.has_value() ? FullPathOf(file) : AbsolutePath(file), arguments, user) && all;
+  }
   return all ? kDone : kNothingFound;
 }
 

@@ -22,6 +22,7 @@ _fileindexctl() {
       compopt -o filenames 2>/dev/null
       mapfile -t -O "${#COMPREPLY[@]}" COMPREPLY < <(compgen "$([[ "$candidate" == :files ]] && echo -f || echo -d)" -- "$word")
       ;;
+    :users) mapfile -t -O "${#COMPREPLY[@]}" COMPREPLY < <(compgen -u -- "$word") ;;
     *)
       # ":" cuts a word, too: only what stands behind the last one is replaced.
       [[ "$word" != *:* || "$COMP_WORDBREAKS" != *:* ]] || before=${word%"${word##*:}"}

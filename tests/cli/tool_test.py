@@ -449,6 +449,7 @@ class ToolTest(unittest.TestCase):
             (["search", "x"], {"search": refused(1406, "this is an instance of user ann")}, 5, "ctl: this is an instance", None),
             (["search", "x"], {"search": refused(1414, "too many at work")}, 3, "too many at work", None),
             (["search", "("], {"search": refused(1403, "character 1")}, 2, "character 1", None),
+            (["search", "--as", "bin", "x"], {}, 5, "only root and the owner", None),
             (["search", "--fresh", "x"], {"fresh": success({"behind": ["photos"]}), "shares": shares, "search": success(found)},
              4, "left out: share photos: it may not", ["photo"]),
             (["search", "--fresh", "--partial", "x"], {"fresh": success({"behind": ["photos"]}), "search": success(found)},
@@ -478,7 +479,7 @@ class ToolTest(unittest.TestCase):
             (["folder", "add", "x", "--kinds=document,v"], [":open", "--kinds=document,video"]),
             (["folder", "delete", "/photos"], [":open", "/photos/a b", "/photos"]),
             (["folder", "add", "/photo/tr"], [":open", "/photo/tree", "/photo/trip"]),
-            (["share", "add", ""], [":folders"]), (["queue", "show", ""], [":files"]), (["share", "forget", "photo", ""], [":folders"]),
+            (["search", "--as", ""], [":users"]), (["share", "add", ""], [":folders"]), (["queue", "show", ""], [":files"]), (["share", "forget", "photo", ""], [":folders"]),
             (["--root", self.root[:4]], [":folders"]), (["index", "photo", ""], []), (["nonsense", ""], []),
         ]
         for words, expected in rows:

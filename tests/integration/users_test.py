@@ -1,13 +1,21 @@
 """What ordinary users of an instance of root's find, and what they can learn beside it. Needs root."""
 
 import glob
+import json
 import os
 import subprocess
+import sys
 import unittest
 
 from instance import BIN, InstanceTestCase, wait_for, write
 
-ANN, BOB = 50001, 50002  # no accounts: the kernel and the service go by numbers
+sys.path.insert(0, os.path.join(os.path.dirname(os.path.abspath(__file__)), "..", "rights"))
+
+from asking import ACCESS, Child, User, acl_bytes, opens  # noqa: E402
+from rights_world import USERS, World  # noqa: E402
+
+TEAM = 50010
+ANN, BOB = User(50001, [50001, TEAM]), User(50002, [50002])  # no accounts: the kernel and the service go by numbers
 
 
 @unittest.skipUnless(os.geteuid() == 0, "takes on other users; needs root")
@@ -15,14 +23,53 @@ class UsersTest(InstanceTestCase):
     def setUp(self):
         super().setUp()
         os.chmod(self.instance.root, 0o755)
+        self.ctl("up")
 
-    def as_user(self, uid, *words, groups=(), program=os.path.join(BIN, "fileindexctl")):
+    def as_user(self, user, *words, program=os.path.join(BIN, "fileindexctl")):
         return subprocess.run([program, *words], env=self.instance.env, cwd="/", capture_output=True, timeout=120,
-                              check=False, user=uid, group=uid, extra_groups=list(groups))
+                              check=False, user=user.uid, group=user.groups[0], extra_groups=user.groups[1:])
+
+    def for_user(self, user, command, *words):
+        """A command as root runs it for a user, and the same, if users are let in, as that user runs it."""
+        numbers = f"{user.uid}:{','.join(map(str, user.groups))}"
+        done = self.instance.run(command, "--as", numbers, *words)
+        if os.stat(f"{self.instance.root}/var/run/kovaelasticd.sock").st_mode & 0o006:
+            own = self.as_user(user, command, *words)
+            self.assertEqual((done.returncode, done.stdout if done.returncode == 0 else b""),
+                             (own.returncode, own.stdout if done.returncode == 0 else b""), own.stderr)
+        return done
+
+    def found(self, user, *words):
+        """The names of the files found, in order."""
+        done = self.for_user(user, "search", "--json", *words)
+        self.assertIn(done.returncode, (0, 1), done.stderr)
+        result = json.loads(done.stdout)
+        self.assertEqual((result["total"], []), (len(result["hits"]), result["left_out"]))
+        return sorted(os.path.basename(hit["doc_id"]) for hit in result["hits"])
+
+    def make_shares(self):
+        """plans, of which each user may read another part, and vault, which neither may enter."""
+        plans, vault = (f"{self.instance.root}/vol/{name}" for name in ("plans", "vault"))
+        for path, uid, gid, mode in (("ann/a.txt", ANN.uid, TEAM, 0o600), ("bob/b.txt", BOB.uid, TEAM, 0o600),
+                                     ("team/c.txt", 0, TEAM, 0o640), ("all.txt", 0, 0, 0o644), ("some.txt", 0, 0, 0o600)):
+            write(f"{plans}/{path}", "lantern in " + path)
+            os.chown(f"{plans}/{path}", uid, gid)
+            os.chmod(f"{plans}/{path}", mode)
+        for name, user in (("ann", ANN), ("bob", BOB)):
+            os.chown(f"{plans}/{name}", user.uid, user.groups[0])
+            os.chmod(f"{plans}/{name}", 0o700)
+        os.setxattr(f"{plans}/some.txt", ACCESS, acl_bytes(6, 0, 0, users={BOB.uid: 4}, mask=4))
+        write(f"{vault}/gold.txt", "lantern of gold")
+        os.chmod(vault, 0o700)
+        for share, file in ((plans, "some.txt"), (vault, "gold.txt")):
+            self.ctl("share", "add", share)
+            wait_for(lambda file=file: self.instance.search(f"lantern name:{file}"), file)
+        return plans, vault
 
     def test_files_of_the_service_tell_others_nothing(self):
-        for folder in ("etc/kova", "var/packages/Ferrox/etc", "var/lib/kova/notifyd/queues"):
-            os.makedirs(f"{self.instance.root}/{folder}")  # as an earlier version left them
+        self.ctl("down")
+        for folder in ("etc/kova", "var/packages/Ferrox/etc", "var/lib/kova/notifyd"):
+            os.chmod(f"{self.instance.root}/{folder}", 0o755)  # as an earlier version left them
         self.ctl("up")
         folder = self.instance.add_share("plans")
         write(f"{folder}/a.txt", "lantern")
@@ -34,6 +81,70 @@ class UsersTest(InstanceTestCase):
         self.assertEqual(b"", names)
         for index in glob.glob(f"{self.instance.root}/var/lib/kova/fileindex/db/*/index.sqlite*"):
             self.assertEqual(0o600, os.stat(index).st_mode & 0o777, index)
+
+    def test_two_users_find_their_own_in_one_share(self):
+        plans, _ = self.make_shares()
+        hers, his = ["a.txt", "all.txt", "c.txt"], ["all.txt", "b.txt", "some.txt"]
+        for words in (["lantern"], ["--share", "plans", "lantern"], ["--sort", "name", "ext:txt"]):
+            self.assertEqual((hers, his), (self.found(ANN, *words), self.found(BOB, *words)))
+        self.assertEqual(["a.txt", "ann"], self.found(ANN, "ann"))
+        self.assertEqual([], self.found(BOB, "ann"))
+        for share in ("vault", "nowhere"):  # one that they may not enter is none
+            done = self.for_user(ANN, "search", "--share", share, "lantern")
+            self.assertEqual((3, f'fileindexctl: there is no share "{share}" here\n'), (done.returncode, done.stderr.decode()))
+        # Page by page, each beginning where the last one says.
+        paged, offset = [], 0
+        for _ in hers:
+            page = json.loads(self.for_user(ANN, "search", "--json", "--limit", "1", "--offset", str(offset), "lantern").stdout)
+            paged += [os.path.basename(hit["doc_id"]) for hit in page["hits"]]
+            offset = page["next_offset"]
+        self.assertEqual(hers, sorted(paged))
+        # What is taken away or given is so at once, or as soon as the index has it.
+        os.chmod(f"{plans}/all.txt", 0o600)
+        self.assertEqual(["b.txt", "some.txt"], self.found(BOB, "lantern"))
+        os.chmod(f"{plans}/bob", 0o755)
+        os.chmod(f"{plans}/bob/b.txt", 0o644)
+        wait_for(lambda: "b.txt" in self.found(ANN, "lantern"), "a file that everybody may read now")
+
+    def test_root_is_told_what_stops_a_user(self):
+        plans, vault = self.make_shares()
+        rows = [(ANN, f"{plans}/bob/b.txt", f"may not enter {plans}/bob: the mode's bits for others\n"),
+                (ANN, f"{plans}/some.txt", f"may not read {plans}/some.txt: the mode's bits for others, since no entry of the ACL"),
+                (BOB, f"{plans}/team/c.txt", f"may not read {plans}/team/c.txt: the mode's bits for others\n"),
+                (BOB, f"{vault}/gold.txt", f"may not enter {vault}: the mode's bits for others\n"),
+                (ANN, f"{plans}/none.txt", f"may not read {plans}/none.txt: No such file")]
+        for user, path, reason in rows:
+            with self.subTest(path=path):
+                done = self.for_user(user, "show", path)
+                self.assertEqual(1, done.returncode, done.stderr)
+                self.assertTrue(done.stdout.decode().startswith(f"{path} is not shown to user {user.uid}: {reason}"), done.stdout)
+                self.assertNotIn(b"all the same", done.stdout)
+        self.assertIn(b"lantern in ann/a.txt", self.for_user(ANN, "show", f"{plans}/ann/a.txt").stdout)
+        self.assertEqual(b"lantern in ann/a.txt", self.for_user(ANN, "show", "--text", "/plans/ann/a.txt").stdout)
+
+    def test_the_rules_that_are_named_are_those_of_the_kernel(self):
+        share, outside = (f"{os.path.realpath(self.instance.root)}/vol/{name}" for name in ("rights", "outside"))
+        os.makedirs(share)
+        os.mkdir(outside)
+        world = World(14, os.fsencode(share), os.fsencode(outside))
+        world.make()
+        os.chmod(share, 0o755)
+        self.ctl("share", "add", share)
+        self.instance.wait_idle("rights", share)
+        paths = sorted(world.entries())
+        shown = 0
+        for user in USERS:
+            numbers = f"{user.uid}:{','.join(map(str, user.groups))}"
+            lines = self.instance.run("show", "--json", "--as", numbers, *paths).stdout.decode().splitlines()
+            allowed = Child(user, lambda: [opens(path) for path in paths]).result()
+            self.assertEqual(len(paths), len(lines))
+            for path, opened, told in zip(paths, allowed, map(json.loads, lines)):
+                self.assertEqual(opened, "KOVAMDPath" in told, (user, path, told))
+                shown += opened
+                if not opened:
+                    granted = [step["granted"] for step in told["way"]]
+                    self.assertEqual((False, [True] * (len(granted) - 1) + [False]), (told["opens"], granted), told)
+        self.assertTrue(0 < shown < len(paths) * len(USERS))
 
 
 if __name__ == "__main__":
