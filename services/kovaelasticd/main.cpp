@@ -8,7 +8,9 @@
 #include "base/files.h"
 #include "common/error.h"
 #include "common/paths.h"
+#include "services/kovaelasticd/commands/caller.h"
 #include "services/kovaelasticd/commands/engine.h"
+#include "services/kovaelasticd/commands/user_limits.h"
 #include "services/support/daemon.h"
 #include "services/support/frame_server.h"
 
@@ -42,6 +44,7 @@ void Serve() {
   options.request_limit_bytes = kRequestMaxBytes;
   options.requests_limit_bytes = 2ULL * kRequestMaxBytes;
   options.workers = kWorkers;
+  options.users = engine::LimitsOfUsers(engine::InstanceOwner());
   services::FrameServer server(options, [&engine](const std::string& request, const services::Peer& peer) {
     return engine.Handle(request, peer);
   });

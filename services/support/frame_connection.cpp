@@ -33,7 +33,8 @@ ssize_t FrameConnection::ReceiveBytes(Chunk& chunk, size_t size, bool takes_desc
 FrameConnection::Progress FrameConnection::Receive(const FrameServerOptions& options, Chunk& chunk) {
   for (;;) {
     const auto body_bytes = BodyBytes();
-    if (body_bytes && *body_bytes > options.request_limit_bytes) return Progress::kBroken;
+    const uint32_t limit_bytes = is_bound ? options.users.request_limit_bytes : options.request_limit_bytes;
+    if (body_bytes && *body_bytes > limit_bytes) return Progress::kBroken;
     const size_t missing = body_bytes ? *body_bytes - body.size() : kHeaderBytes - done_;
     if (missing == 0) return Progress::kComplete;
     const ssize_t got = ReceiveBytes(chunk, std::min(missing, chunk.size()), options.takes_descriptors);

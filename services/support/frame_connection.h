@@ -21,7 +21,8 @@ struct FrameConnection {
   using SteadyClock = std::chrono::steady_clock;
   /// What a request is read through; one for each thread.
   using Chunk = std::array<char, 64 * 1024>;
-  enum class State { kReceiving, kSending };
+  /// kWaiting: the request is complete and waits for its turn (RequestGate).
+  enum class State { kReceiving, kWaiting, kSending };
   /// kMore: the peer must go on first. kBroken: it has gone, or announces more than it may; nothing more comes.
   enum class Progress { kMore, kComplete, kBroken };
 
@@ -37,6 +38,7 @@ struct FrameConnection {
   Peer peer;
   base::UniqueFd descriptor;  ///< peer.descriptor
   bool busy = false;          ///< a thread is at work on it
+  bool is_bound = false;      ///< by UserLimits
   State state = State::kReceiving;
   std::string body;  ///< of the request as far as it has come, or of the reply
   SteadyClock::time_point last_progress = SteadyClock::now();

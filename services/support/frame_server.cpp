@@ -5,23 +5,24 @@
 #include <sys/epoll.h>
 #include <sys/eventfd.h>
 #include <sys/socket.h>
-#include <sys/stat.h>
-#include <sys/un.h>
 #include <syslog.h>
 #include <unistd.h>
 
 #include <algorithm>
 #include <atomic>
 #include <cerrno>
-#include <cstring>
 #include <memory>
+#include <optional>
 #include <thread>
 #include <unordered_map>
 #include <vector>
 
 #include "base/mutex.h"
+#include "base/scope_exit.h"
 #include "common/log.h"
 #include "services/support/frame_connection.h"
+#include "services/support/listening_socket.h"
+#include "services/support/request_gate.h"
 
 namespace ferrox::services {
 
@@ -35,59 +36,6 @@ constexpr uint64_t kFirstConnectionId = 2;
 constexpr size_t kLargeBytes = 8U << 20;  // a request and its reply, beyond which free memory goes back to the kernel
 constexpr int kTickMs = 1000;             // between two looks for idle connections
 constexpr int kFullMs = 10;               // the pause when the process has no descriptor left
-
-sockaddr_un AddressOf(const std::string& path) {
-  sockaddr_un address = {};
-  address.sun_family = AF_UNIX;
-  FERROX_FAIL_IF(path.size() >= sizeof(address.sun_path), Error::kInternal,
-                 "socket path " + path + " is too long; choose a shorter root");
-  memcpy(address.sun_path, path.c_str(), path.size() + 1);
-  return address;
-}
-
-/// Removes the socket file of a process that has died. bind() refuses a path that exists, and no process removes its
-/// socket when it is killed.
-void RemoveStaleSocket(const std::string& path, const sockaddr_un& address) {
-  const base::UniqueFd probe(socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0));
-  const bool served =
-      connect(probe.Get(), reinterpret_cast<const sockaddr*>(&address), static_cast<socklen_t>(sizeof(address))) == 0;
-  FERROX_FAIL_IF(served, Error::kInternal, path + " is served by another process; stop it first");
-  struct stat status = {};
-  if (lstat(path.c_str(), &status) == 0 && S_ISSOCK(status.st_mode)) (void)unlink(path.c_str());
-}
-
-base::UniqueFd Listen(const std::string& path, mode_t mode) {
-  const sockaddr_un address = AddressOf(path);
-  RemoveStaleSocket(path, address);
-  base::UniqueFd listener(socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0));
-  FERROX_FAIL_IF(!listener.Valid(), Error::kInternal, "socket: " + ErrnoText());
-  (void)fchmod(listener.Get(), mode);  // what bind gives the file; chmod makes it certain whatever the umask
-  const bool listening =
-      bind(listener.Get(), reinterpret_cast<const sockaddr*>(&address), static_cast<socklen_t>(sizeof(address))) == 0 &&
-      chmod(path.c_str(), mode) == 0 && listen(listener.Get(), SOMAXCONN) == 0;
-  FERROX_FAIL_IF(!listening, Error::kInternal, "cannot serve " + path + ": " + ErrnoText());
-  return listener;
-}
-
-/// The supplementary groups of the peer. The kernel says how many there are when the room is too small.
-std::vector<gid_t> GroupsOf(int fd) {
-  std::vector<gid_t> groups(64);
-  auto size = static_cast<socklen_t>(groups.size() * sizeof(gid_t));
-  int result = getsockopt(fd, SOL_SOCKET, SO_PEERGROUPS, groups.data(), &size);
-  if (result != 0 && errno == ERANGE) {
-    groups.resize(size / sizeof(gid_t));
-    result = getsockopt(fd, SOL_SOCKET, SO_PEERGROUPS, groups.data(), &size);
-  }
-  groups.resize(result == 0 ? size / sizeof(gid_t) : 0);
-  return groups;
-}
-
-Peer PeerOf(int fd) {
-  ucred credentials = {};
-  socklen_t size = sizeof(credentials);
-  if (getsockopt(fd, SOL_SOCKET, SO_PEERCRED, &credentials, &size) != 0) return {static_cast<uid_t>(-1)};
-  return {credentials.uid, credentials.gid, credentials.pid, GroupsOf(fd)};
-}
 
 }  // namespace
 
@@ -103,6 +51,7 @@ class FrameServer::Impl {
   Impl(FrameServerOptions options, Handler handler)
       : options_(std::move(options)),
         handler_(std::move(handler)),
+        gate_({std::max(options_.workers / 2, 1U), options_.users.at_work, options_.users.waiting}),
         listener_(Listen(options_.socket_path, options_.socket_mode)),
         control_(epoll_create1(EPOLL_CLOEXEC)),
         ready_(epoll_create1(EPOLL_CLOEXEC)),
@@ -143,7 +92,7 @@ class FrameServer::Impl {
   using Chunk = FrameConnection::Chunk;
   using Progress = FrameConnection::Progress;
   using Connections = std::unordered_map<uint64_t, std::unique_ptr<FrameConnection>>;
-  enum class Next { kReceive, kSend, kEnd };
+  enum class Next { kReceive, kSend, kEnd, kTurn };
 
   static void Watch(const base::UniqueFd& epoll, int operation, int fd, uint64_t id, uint32_t events) {
     epoll_event event = {};
@@ -163,20 +112,37 @@ class FrameServer::Impl {
       base::UniqueFd fd(accept4(listener_.Get(), nullptr, nullptr, SOCK_CLOEXEC | SOCK_NONBLOCK));
       const bool full = !fd.Valid() && (errno == EMFILE || errno == ENFILE);
       if (!fd.Valid() && !full) return;
+      std::unique_ptr<FrameConnection> newcomer = fd.Valid() ? NewConnection(std::move(fd)) : nullptr;
       base::MutexLock lock(mutex_);
-      const bool room = (!full && connections_.size() < options_.connections_max) || EndLongestIdle();
-      if (fd.Valid() && room) Add(std::move(fd));
+      const bool room = newcomer != nullptr ? MakeRoom(*newcomer) : EndLongestIdle(&IsAny);
+      if (newcomer != nullptr && room) Add(std::move(newcomer));
       lock.Unlock();
       // The listener stays readable: a pause keeps the loop from spinning until a descriptor is free.
       if (full && !room) return (void)poll(nullptr, 0, kFullMs);
     }
   }
 
-  void Add(base::UniqueFd fd) BASE_REQUIRES(mutex_) {
+  std::unique_ptr<FrameConnection> NewConnection(base::UniqueFd fd) const {
     auto connection = std::make_unique<FrameConnection>();
-    connection->id = next_id_++;
     connection->peer = PeerOf(fd.Get());
+    connection->is_bound = options_.users.is_bound != nullptr && options_.users.is_bound(connection->peer);
     connection->fd = std::move(fd);
+    return connection;
+  }
+
+  /// Ends another connection where there is no room for one more. False where that cannot be.
+  bool MakeRoom(const FrameConnection& newcomer) BASE_REQUIRES(mutex_) {
+    const auto is_own = [&newcomer](const FrameConnection& one) {
+      return one.is_bound && one.peer.uid == newcomer.peer.uid;
+    };
+    if (newcomer.is_bound && Count(is_own) >= options_.users.connections) return EndLongestIdle(is_own);
+    if (newcomer.is_bound && Count(&IsBound) >= options_.connections_max / 2) return EndLongestIdle(&IsBound);
+    if (connections_.size() < options_.connections_max) return true;
+    return EndLongestIdle(newcomer.is_bound ? &IsBound : &IsAny);
+  }
+
+  void Add(std::unique_ptr<FrameConnection> connection) BASE_REQUIRES(mutex_) {
+    connection->id = next_id_++;
     Watch(ready_, EPOLL_CTL_ADD, connection->fd.Get(), connection->id, EPOLLIN | EPOLLONESHOT);
     connections_[connection->id] = std::move(connection);
   }
@@ -187,7 +153,9 @@ class FrameServer::Impl {
     while (!stop_) {
       epoll_event event = {};
       if (epoll_wait(ready_.Get(), &event, 1, -1) != 1 || event.data.u64 == kStopId) continue;
-      if (FrameConnection* connection = Take(event.data.u64)) Give(*connection, Advance(*connection, chunk));
+      for (FrameConnection* next = Take(event.data.u64); next != nullptr; next = TakeWaiting()) {
+        Give(*next, Advance(*next, chunk));
+      }
     }
   }
 
@@ -200,7 +168,37 @@ class FrameServer::Impl {
     return it->second.get();
   }
 
+  /// The same of one whose request may run now. Every thread asks for it after its own work, which may have been what
+  /// the other waits for.
+  FrameConnection* TakeWaiting() {
+    const base::MutexLock lock(mutex_);
+    const std::optional<uint64_t> id = stop_ ? std::nullopt : gate_.Next();
+    if (!id.has_value()) return nullptr;
+    FrameConnection* const connection = connections_.find(*id)->second.get();
+    connection->busy = true;
+    return connection;
+  }
+
+  /// Of a bound user's request, whether it may run. One that has to wait is no longer the calling thread's.
+  RequestGate::Admission Enter(FrameConnection& connection) {
+    if (!connection.is_bound) return RequestGate::Admission::kRun;
+    const base::MutexLock lock(mutex_);
+    const RequestGate::Admission admission = gate_.Enter(connection.peer.uid, connection.id);
+    if (admission == RequestGate::Admission::kWait) {
+      connection.state = FrameConnection::State::kWaiting;
+      connection.busy = false;
+    }
+    return admission;
+  }
+
+  void Leave(const FrameConnection& connection) {
+    if (!connection.is_bound) return;
+    const base::MutexLock lock(mutex_);
+    gate_.Leave(connection.peer.uid);
+  }
+
   void Give(FrameConnection& connection, Next next) {
+    if (next == Next::kTurn) return;
     const base::MutexLock lock(mutex_);
     connection.busy = false;
     if (next == Next::kEnd) {
@@ -221,11 +219,11 @@ class FrameServer::Impl {
       const uint64_t added = connection.body.size() - before;
       if ((request_bytes_ += added) > options_.requests_limit_bytes || progress == Progress::kBroken) return Next::kEnd;
       if (progress == Progress::kMore) return Next::kReceive;
-      FrameReply reply = handler_(connection.body, connection.peer);
-      const size_t worked_on = connection.body.size() + reply.body.size();
-      request_bytes_ -= connection.body.size();
-      connection.BeginSending(std::move(reply));
-      if (worked_on > kLargeBytes) (void)malloc_trim(0);  // what it took lies scattered, and the daemon runs for months
+      const RequestGate::Admission admission = Enter(connection);
+      if (admission == RequestGate::Admission::kWait) return Next::kTurn;
+      Answer(connection, admission == RequestGate::Admission::kRefused);
+    } else if (connection.state == FrameConnection::State::kWaiting) {
+      Answer(connection, false);
     }
     const Progress progress = connection.Send();
     if (progress == Progress::kBroken) return Next::kEnd;
@@ -237,8 +235,22 @@ class FrameServer::Impl {
     return Next::kEnd;
   }
 
+  void Answer(FrameConnection& connection, bool is_refused) {
+    FrameReply reply = is_refused ? FrameReply(options_.users.refusal) : Handle(connection);
+    const size_t worked_on = connection.body.size() + reply.body.size();
+    request_bytes_ -= connection.body.size();
+    connection.BeginSending(std::move(reply));
+    if (worked_on > kLargeBytes) (void)malloc_trim(0);  // what it took lies scattered, and the daemon runs for months
+  }
+
+  FrameReply Handle(const FrameConnection& connection) {
+    const base::ScopeExit leave([&] { Leave(connection); });
+    return handler_(connection.body, connection.peer);
+  }
+
   void End(FrameConnection& connection) BASE_REQUIRES(mutex_) {
-    if (connection.state == FrameConnection::State::kReceiving) request_bytes_ -= connection.body.size();
+    if (connection.state != FrameConnection::State::kSending) request_bytes_ -= connection.body.size();
+    if (connection.state == FrameConnection::State::kWaiting) gate_.Forget(connection.peer.uid, connection.id);
     if (connection.descriptor.Valid()) options_.on_end(connection.descriptor.Get());
     connections_.erase(connection.id);
   }
@@ -250,15 +262,29 @@ class FrameServer::Impl {
     const base::MutexLock lock(mutex_);
     for (auto it = connections_.begin(); it != connections_.end();) {
       FrameConnection& current = *it++->second;
-      if (!current.busy && now - current.last_progress > options_.idle_timeout) End(current);
+      if (IsIdle(current) && now - current.last_progress > options_.idle_timeout) End(current);
     }
   }
 
-  /// Makes room for a new connection: the one without progress for the longest time goes. False when all are at work.
-  bool EndLongestIdle() BASE_REQUIRES(mutex_) {
+  static bool IsAny(const FrameConnection&) { return true; }
+  static bool IsBound(const FrameConnection& connection) { return connection.is_bound; }
+  static bool IsIdle(const FrameConnection& connection) {
+    return !connection.busy && connection.state != FrameConnection::State::kWaiting;
+  }
+
+  template <typename Which>
+  unsigned Count(Which which) const BASE_REQUIRES(mutex_) {
+    return static_cast<unsigned>(std::count_if(connections_.begin(), connections_.end(),
+                                               [&which](const auto& entry) { return which(*entry.second); }));
+  }
+
+  /// Makes room for a new connection: of those that may go, the one without progress for the longest time goes. False
+  /// when all are at work.
+  template <typename MayGo>
+  bool EndLongestIdle(MayGo may_go) BASE_REQUIRES(mutex_) {
     FrameConnection* longest = nullptr;
     for (const auto& [id, connection] : connections_) {
-      if (connection->busy) continue;
+      if (!IsIdle(*connection) || !may_go(*connection)) continue;
       if (longest == nullptr || connection->last_progress < longest->last_progress) longest = connection.get();
     }
     if (longest == nullptr) return false;
@@ -268,6 +294,7 @@ class FrameServer::Impl {
 
   const FrameServerOptions options_;
   const Handler handler_;
+  RequestGate gate_ BASE_GUARDED_BY(mutex_);
   base::UniqueFd listener_;
   base::UniqueFd control_;  ///< what the accepting thread waits for
   base::UniqueFd ready_;    ///< connections that nobody is at work on; what the answering threads wait for

@@ -32,6 +32,21 @@ struct FrameReply {
   base::UniqueFd descriptor;
 };
 
+/// What each of those who are bound may use of a server. All of them together have at most half of its connections and
+/// half of its workers, so that the others always find some.
+struct UserLimits {
+  /// Whether a peer is bound; null: nobody is.
+  std::function<bool(const Peer& peer)> is_bound = nullptr;
+  uint32_t request_limit_bytes = 64U << 10;
+  /// Beyond these a new connection takes the place of the user's own that was idle for the longest time, or is closed.
+  unsigned connections = 16;
+  /// Requests that are answered at a time, and those that wait for their turn; a further one is refused at once.
+  unsigned at_work = 2;
+  unsigned waiting = 8;
+  /// The reply that refuses it.
+  std::string refusal = {};
+};
+
 struct FrameServerOptions {
   std::string socket_path;
   mode_t socket_mode = 0600;
@@ -43,6 +58,7 @@ struct FrameServerOptions {
   unsigned workers = 4;
   /// A connection on which no byte moves for this long is ended, between two requests too.
   std::chrono::seconds idle_timeout{60};
+  UserLimits users = {};
   /// Whether a request may bring a descriptor (SCM_RIGHTS) along; else it is closed.
   bool takes_descriptors = false;
   /// Called with the descriptor of a connection when that ends.

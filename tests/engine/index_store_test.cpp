@@ -5,6 +5,7 @@
 
 #include <gtest/gtest.h>
 
+#include "services/kovaelasticd/store/work_limit.h"
 #include "tests/engine/store_helpers.h"
 #include "tests/support/temp_dir.h"
 
@@ -375,6 +376,31 @@ TEST_F(IndexStoreTest, ValuesOfAllTypesAreLoadedAsTheyWereStored) {
   Reopen();
   document.removeMember("KOVAMDTextContent");
   EXPECT_EQ(Load("/v/a"), document);
+}
+
+TEST_F(IndexStoreTest, WorkThatTakesTooLongEndsAndTheNextSearchRunsOn) {
+  Put("/v/a", "word");
+  store_->Commit();
+  Database endless(folder_ / "endless.sqlite", Database::Mode::kCreate);
+  const auto code = [](const auto& work) {
+    try {
+      work();
+      return 0;
+    } catch (const Error& error) {
+      return static_cast<int>(error.Code());
+    }
+  };
+  {
+    const WorkLimit limit(std::chrono::milliseconds(1));
+    WorkLimit::Apply(endless.Handle());
+    EXPECT_EQ(Error::kEngineUserBusy, code([&] {
+                (void)endless.QueryInt(
+                    "WITH RECURSIVE n(x) AS (SELECT 1 UNION ALL SELECT x + 1 FROM n) "
+                    "SELECT count(*) FROM n");
+              }));
+    EXPECT_EQ(Error::kEngineUserBusy, code([&] { (void)FindPaths(*store_, "word"); }));
+  }
+  EXPECT_EQ("/v/a", FindPaths(*store_, "word"));
 }
 
 }  // namespace

@@ -1,9 +1,14 @@
 // Catches clients that cost the server more than their own connection.
 #include "services/support/frame_server.h"
 
+#include <poll.h>
 #include <sys/socket.h>
 #include <sys/un.h>
 
+#include <algorithm>
+#include <atomic>
+#include <future>
+#include <list>
 #include <optional>
 #include <thread>
 
@@ -11,6 +16,7 @@
 
 #include "common/error.h"
 #include "services/support/json_command.h"
+#include "services/support/request_gate.h"
 #include "tests/support/temp_dir.h"
 
 namespace ferrox::services {
@@ -40,6 +46,11 @@ class Client {
     SendLength(static_cast<uint32_t>(body.size()));
     SendRaw(body);
     return ReceiveFrame();
+  }
+
+  bool HasReply() {
+    pollfd state = {fd_.Get(), POLLIN, 0};
+    return poll(&state, 1, 1) == 1;
   }
 
   /// The next reply's body; none when the server has ended the connection.
@@ -145,6 +156,63 @@ TEST_F(FrameServerTest, NewcomerTakesThePlaceOfTheLongestSilent) {
   EXPECT_EQ(third.Ask("3"), "3");
   EXPECT_EQ(oldest.ReceiveFrame(), std::nullopt);
   EXPECT_EQ(second.Ask("4"), "4");
+}
+
+TEST_F(FrameServerTest, ABoundUserHasFewRequestsAndConnections) {
+  options_.users.is_bound = [](const Peer&) { return true; };
+  options_.users.refusal = "refused";
+  options_.users.request_limit_bytes = 100;
+  options_.workers = 16;
+  std::atomic<int> at_work{0};
+  std::promise<void> go_on;
+  const std::shared_future<void> until = go_on.get_future().share();
+  server_ = std::make_unique<FrameServer>(options_, [&](const std::string& request, const Peer&) {
+    if (request != "long") return request;
+    ++at_work;
+    until.wait();
+    return request;
+  });
+  thread_ = std::thread([this] { server_->Run(-1); });
+  std::list<Client> clients;
+  for (int i = 0; i < 16; ++i) {
+    clients.emplace_back(path_);
+    clients.back().SendLength(4);
+    clients.back().SendRaw("long");
+  }
+  std::list<Client> refused;  // 2 are at work, 8 wait
+  for (auto it = clients.begin(); refused.size() < 6; it = clients.begin()) {
+    while (it != clients.end() && !it->HasReply()) ++it;
+    if (it != clients.end()) refused.splice(refused.end(), clients, it);
+  }
+  for (Client& client : refused) EXPECT_EQ(client.ReceiveFrame(), "refused");
+  EXPECT_EQ(Client(path_).Ask("short"), "refused");
+  const auto ended = std::find_if(refused.begin(), refused.end(), [](Client& client) { return client.HasReply(); });
+  ASSERT_NE(ended, refused.end()) << "the newcomer takes the place of an idle one";
+  EXPECT_EQ(ended->ReceiveFrame(), std::nullopt);
+  refused.erase(ended);
+  EXPECT_EQ(at_work, 2);
+  go_on.set_value();
+  for (Client& client : clients) EXPECT_EQ(client.ReceiveFrame(), "long");
+  EXPECT_EQ(refused.back().Ask("short"), "short");
+  refused.back().SendLength(101);
+  EXPECT_EQ(refused.back().ReceiveFrame(), std::nullopt);
+}
+
+TEST(RequestGateTest, AmongUsersTheOneWithTheFewestAtWorkComesNext) {
+  using Admission = RequestGate::Admission;
+  RequestGate gate({3, 2, 2});
+  for (const uint64_t id : {10, 11}) EXPECT_EQ(Admission::kRun, gate.Enter(1, id));
+  for (const uint64_t id : {12, 13}) EXPECT_EQ(Admission::kWait, gate.Enter(1, id));
+  EXPECT_EQ(Admission::kRefused, gate.Enter(1, 14));
+  EXPECT_EQ(Admission::kRun, gate.Enter(2, 20));
+  EXPECT_EQ(Admission::kWait, gate.Enter(3, 30)) << "all together have no more";
+  EXPECT_EQ(std::nullopt, gate.Next());
+  gate.Leave(1);
+  EXPECT_EQ(std::optional<uint64_t>(30), gate.Next()) << "though it came last";
+  gate.Leave(2);
+  gate.Forget(1, 12);
+  EXPECT_EQ(std::optional<uint64_t>(13), gate.Next());
+  EXPECT_EQ(std::nullopt, gate.Next());
 }
 
 TEST_F(FrameServerTest, ReplacesADeadProcessesSocketButNotALiveOnes) {

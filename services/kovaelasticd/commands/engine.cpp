@@ -9,6 +9,8 @@
 #include "common/log.h"
 #include "services/kovaelasticd/commands/members.h"
 #include "services/kovaelasticd/commands/user_error.h"
+#include "services/kovaelasticd/commands/user_limits.h"
+#include "services/kovaelasticd/store/work_limit.h"
 
 namespace ferrox::engine {
 
@@ -112,6 +114,8 @@ Engine::Engine(const std::string& state_folder, LookFunction look)
 std::string Engine::Handle(const std::string& request, const services::Peer& peer) {
   const auto began = std::chrono::steady_clock::now();
   const Caller caller = CallerOf(peer, instance_owner_);
+  std::optional<WorkLimit> limit;
+  if (!caller.privileged) limit.emplace(kUserWorkLongest);
   std::string text;
   const Json::Value failure = ReplyOf(caller, [&] {
     text = Answer(request, caller);

@@ -8,6 +8,7 @@ std::string SentenceForUsers(const Error& error) {
     case Error::kBadArgument:
     case Error::kEngineUnknownCommand:
     case Error::kEngineBadRequest:
+    case Error::kEngineUserBusy:
       return error.what();
     case Error::kEngineBusyMemory:
       return "the engine is short of memory; ask again later";

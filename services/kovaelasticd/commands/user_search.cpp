@@ -34,7 +34,8 @@ void AddLeftOutShare(UserScope& scope, const std::string& share, const Error& er
 
 /// Rethrows where it is the one share that was named, or the request is at fault.
 void LeaveOutShare(UserScope& scope, const std::string& share, const Error& error) {
-  if (scope.one_named || error.Code() == Error::kEngineBadRequest) {
+  const bool is_of_request = error.Code() == Error::kEngineBadRequest || error.Code() == Error::kEngineUserBusy;
+  if (scope.one_named || is_of_request) {
     throw UserError(error.Code(), SentenceForUsers(error));
   }
   AddLeftOutShare(scope, share, error, false);

@@ -8,6 +8,7 @@
 #include "services/kovaelasticd/search/path_condition.h"
 #include "services/kovaelasticd/store/document.h"
 #include "services/kovaelasticd/store/store_rows.h"
+#include "services/kovaelasticd/store/work_limit.h"
 #include "services/kovaelasticd/text/words.h"
 
 namespace ferrox::engine {
@@ -48,6 +49,7 @@ void AppendOr(std::string& expression, const std::string& alternative) {
 }  // namespace
 
 DocSet QueryEvaluator::Evaluate(const QueryNode& node, bool ranking) {
+  WorkLimit::Check();
   switch (node.type) {
     case QueryNode::Type::kAll:
       return visible_.All();

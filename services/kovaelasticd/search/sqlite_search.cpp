@@ -9,6 +9,7 @@
 #include "services/kovaelasticd/store/packed_fields.h"
 #include "services/kovaelasticd/store/sqlite_store.h"
 #include "services/kovaelasticd/store/suggest.h"
+#include "services/kovaelasticd/store/work_limit.h"
 #include "services/kovaelasticd/text/snippet.h"
 
 namespace ferrox::engine {
@@ -49,7 +50,10 @@ SearchReply Searcher::Run() {
   const std::vector<RankedDocument> page = request_.sort == SortKey::kRelevance
                                                ? OrderByRelevance(documents, evaluator.Words(), reply)
                                                : ColumnOrder(reader_, visible_, request_).Page(documents, reply.total);
-  for (const RankedDocument& ranked : page) reply.hits.push_back(LoadHit(ranked, evaluator.Words()));
+  for (const RankedDocument& ranked : page) {
+    WorkLimit::Check();
+    reply.hits.push_back(LoadHit(ranked, evaluator.Words()));
+  }
   if (reply.total == 0) {
     const std::vector<std::string>& words = evaluator.Words().looked_for;
     reply.suggestions =

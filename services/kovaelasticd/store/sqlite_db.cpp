@@ -8,6 +8,7 @@
 #include "common/log.h"
 #include "services/kovaelasticd/store/checksum_vfs.h"
 #include "services/kovaelasticd/store/page_checksums.h"
+#include "services/kovaelasticd/store/work_limit.h"
 
 namespace ferrox::engine {
 
@@ -150,6 +151,7 @@ void Database::CheckDamage(int result) {
 }
 
 void Database::Fail(int result) {
+  if ((result & 0xFF) == SQLITE_INTERRUPT) WorkLimit::Fail();
   const char* detail = handle_ != nullptr ? sqlite3_errmsg(handle_.get()) : "";
   const std::string reason = "index file " + path_ + ": " + Remedy(result);
   const FailSite site = {__FILE__, __LINE__, __func__, detail};

@@ -2,6 +2,7 @@
 
 #include "services/kovaelasticd/store/fts.h"
 #include "services/kovaelasticd/store/store_rows.h"
+#include "services/kovaelasticd/store/work_limit.h"
 
 namespace ferrox::engine {
 
@@ -41,10 +42,13 @@ std::unique_ptr<StoreReader> ReaderPool::Borrow() {
     if (!idle_.empty()) {
       std::unique_ptr<StoreReader> reader = std::move(idle_.back());
       idle_.pop_back();
+      WorkLimit::Apply(reader->database.Handle());
       return reader;
     }
   }
-  return std::make_unique<StoreReader>(path_, hidden_documents_, places_, readable_);
+  auto reader = std::make_unique<StoreReader>(path_, hidden_documents_, places_, readable_);
+  WorkLimit::Apply(reader->database.Handle());
+  return reader;
 }
 
 void ReaderPool::Return(std::unique_ptr<StoreReader> reader) {

@@ -47,7 +47,8 @@ class ReaderPool {
   /// `path` is the index file.
   explicit ReaderPool(std::string path) : path_(std::move(path)) {}
 
-  /// An idle connection, or a new one: a search never waits for another. @throws Error kEngineStorage, IndexDamaged.
+  /// An idle connection, or a new one: a search never waits for another. It keeps to the calling thread's WorkLimit.
+  /// @throws Error kEngineStorage, IndexDamaged.
   std::unique_ptr<StoreReader> Borrow();
   /// Takes a connection back that has no transaction open. After a failure do not return it: it is closed then.
   void Return(std::unique_ptr<StoreReader> reader);

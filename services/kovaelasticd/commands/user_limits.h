@@ -1,0 +1,17 @@
+#pragma once
+
+#include <chrono>
+#include <cstdint>
+
+#include "services/support/frame_server.h"
+
+namespace ferrox::engine {
+
+/// How long the engine works for one request of an ordinary user.
+inline constexpr std::chrono::seconds kUserWorkLongest{2};
+
+/// What one ordinary user may use of the engine's server: 64 KiB a request, 16 connections, 2 requests at work and 8
+/// that wait. Whoever is privileged (CallerOf) is not bound.
+services::UserLimits LimitsOfUsers(uint32_t instance_owner);
+
+}  // namespace ferrox::engine
