@@ -91,6 +91,10 @@ class UsersTest(InstanceTestCase):
             self.assertEqual((hers, his), (self.found(ANN, *words), self.found(BOB, *words)))
         self.assertEqual(["a.txt", "ann"], self.found(ANN, "ann"))
         self.assertEqual([], self.found(BOB, "ann"))
+        for account in ("nobody", "65534"):
+            shown = self.instance.run("search", "--as", account, "lantern").stdout
+            self.assertEqual([b"all.txt"], [os.path.basename(line) for line in shown.splitlines() if line.startswith(b"/")])
+        self.assertIn(b'no user "no-body"', self.instance.run("search", "--as", "no-body", "lantern").stderr)
         for share in ("vault", "nowhere"):  # one that they may not enter is none
             done = self.for_user(ANN, "search", "--share", share, "lantern")
             self.assertEqual((3, f'fileindexctl: there is no share "{share}" here\n'), (done.returncode, done.stderr.decode()))
