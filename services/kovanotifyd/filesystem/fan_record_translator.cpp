@@ -34,8 +34,7 @@ bool ExchangeDetector::IsSecond(const FanRecord& record) {
 
 void FanRecordTranslator::Translate(const FanRecord& record, WatchListener& listener) {
   if (parts_.marks.IsCookie(record)) return listener.OnCookie();
-  // The number of a file's links changed; the record of the name that came or went reports the change.
-  if (record.folder.empty()) return parts_.linked.OnLinks(record.target);
+  if (record.folder.empty()) return ReportLinks(record, listener);
   if ((record.mask & FAN_RENAME) != 0) {
     TranslateRename(record, listener);
   } else {
@@ -88,12 +87,21 @@ bool FanRecordTranslator::ReportDeleted(const FanRecord& record, WatchListener& 
 void FanRecordTranslator::ReportByNumber(const FanRecord& record, WatchListener& listener) {
   const std::optional<uint64_t> file = parts_.linked.NumberToReport(record);
   if (!file.has_value()) return parts_.finder.ReportUncertain(record.folder, listener);
-  if (*file == 0) return;
   const bool of_attributes = (record.mask & FAN_ATTRIB) != 0;
-  for (const std::string& root : parts_.roots.PathsOn(record.target)) {
-    listener.OnChange(
-        {of_attributes ? ChangeKind::kAttributesByNumber : ChangeKind::kByNumber, false, root, {}, *file});
-  }
+  ReportNumber(record, of_attributes ? ChangeKind::kAttributesByNumber : ChangeKind::kByNumber, *file, listener);
+}
+
+/// The number of a file's links changed, and with it the ctime that the index keeps of it. The record of the name that
+/// came or went says nothing of the others, which may be the only ones in a root.
+void FanRecordTranslator::ReportLinks(const FanRecord& record, WatchListener& listener) {
+  parts_.linked.OnLinks(record.target);
+  ReportNumber(record, ChangeKind::kAttributesByNumber, parts_.linked.NumberOf(record.target, 1), listener);
+}
+
+void FanRecordTranslator::ReportNumber(const FanRecord& record, ChangeKind kind, uint64_t file,
+                                       WatchListener& listener) {
+  if (file == 0) return;
+  for (const std::string& root : parts_.roots.PathsOn(record.target)) listener.OnChange({kind, false, root, {}, file});
 }
 
 /// Who may not pass a folder may read nothing in the roots below it.
@@ -114,6 +122,8 @@ void FanRecordTranslator::TranslateRename(const FanRecord& record, WatchListener
       parts_.finder.ReportUncertain(record.new_folder, listener);
     }
     parts_.queue.NoteMoved(record.target, place);
+  } else {  // its ctime is another one under all its names
+    ReportNumber(record, ChangeKind::kAttributesByNumber, parts_.linked.NumberOf(record.target, 2), listener);
   }
   // What the first record of an exchange moved to the old name is there now: this one did not move it away.
   if (exchanges_.IsSecond(record)) paths_.clear();

@@ -65,6 +65,8 @@ class FanRecordTranslator {
   void TranslateRename(const FanRecord& record, WatchListener& listener);
   void ReportRename(const FanRecord& record, WatchListener& listener);
   void ReportByNumber(const FanRecord& record, WatchListener& listener);
+  void ReportLinks(const FanRecord& record, WatchListener& listener);
+  void ReportNumber(const FanRecord& record, Change::Kind kind, uint64_t file, WatchListener& listener);
   void ReportAboveRoots(const FanRecord& record, WatchListener& listener);
 
   Parts parts_;

@@ -27,6 +27,14 @@ std::optional<uint64_t> LinkedFiles::NumberToReport(const FanRecord& record) {
   return 0;
 }
 
+uint64_t LinkedFiles::NumberOf(const HandleKey& file, unsigned names_min) {
+  if (file.empty() || (names_min > 1 && alone_.count(file) != 0)) return 0;
+  const base::UniqueFd opened = mounts_.Open(file, O_PATH | O_NOFOLLOW);
+  struct stat status = {};
+  if (!opened.Valid() || fstat(opened.Get(), &status) != 0) return 0;
+  return S_ISREG(status.st_mode) && status.st_nlink >= names_min ? status.st_ino : 0;
+}
+
 /// By the file's handle: its number of links, and whether the name in the record still leads to it.
 std::optional<uint64_t> LinkedFiles::Examine(const FanRecord& record) {
   const base::UniqueFd file = mounts_.Open(record.target, O_PATH | O_NOFOLLOW);

@@ -26,6 +26,8 @@ class LinkedFiles {
   /// The number of the file that the record is about, if its change has to be reported by it; 0 if not. Nothing when
   /// that cannot be found out.
   std::optional<uint64_t> NumberToReport(const FanRecord& record);
+  /// The number of the file, if it is a regular one that is there and has at least so many names; else 0.
+  uint64_t NumberOf(const HandleKey& file, unsigned names_min);
   /// To be called when no records are waiting: a file that is created after that has no links that were reported
   /// before.
   void Rest();
