@@ -81,12 +81,15 @@ def disk(folder):
             if stat.S_ISLNK(status.st_mode):
                 continue
             is_folder = stat.S_ISDIR(status.st_mode)
-            stamp = f"{status.st_size}.{status.st_mtime_ns}.{status.st_ctime_ns}.{status.st_ino}"
-            found[entry.path] = facts(is_folder, status.st_size, status.st_mtime_ns // 10**9, stamp,
+            found[entry.path] = facts(is_folder, status.st_size, status.st_mtime_ns // 10**9, stamp(status),
                                       access(entry.path, status), "" if is_folder else text(entry.path))
             if is_folder:
                 found.update(disk(entry.path))
     return found
+
+
+def stamp(status):
+    return f"{status.st_size}.{status.st_mtime_ns}.{status.st_ctime_ns}.{status.st_ino}"
 
 
 def access(path, status):
@@ -101,10 +104,10 @@ def access(path, status):
     return ":".join([mode, ",".join(entries)] if entries else [mode])
 
 
-def facts(is_folder, size, seconds, stamp, rights, content):
+def facts(is_folder, size, seconds, seen, rights, content):
     if is_folder:  # what changes in a folder is told, not that the folder's own size and times change
-        return {"folder": True, "inode": stamp.split(".")[3], "rights": rights}
-    return {"folder": False, "rights": rights, "size": size, "mtime": seconds, "stamp": stamp, "text": content}
+        return {"folder": True, "inode": seen.split(".")[3], "rights": rights}
+    return {"folder": False, "rights": rights, "size": size, "mtime": seconds, "stamp": seen, "text": content}
 
 
 def text(path):

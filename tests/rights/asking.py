@@ -54,8 +54,13 @@ class SharedInstance(LiveInstance):
         os.chmod(self.root, 0o755)
         self.ctl("up")
 
+        os.chmod(self.engine_socket(), 0o666)  # whatever it is on an installed system
+
+    def engine_socket(self):
+        return f"{self.root}/var/run/kovaelasticd.sock"
+
     def connect(self):
-        return Engine(f"{self.root}/var/run/kovaelasticd.sock")
+        return Engine(self.engine_socket())
 
 
 class Engine:
