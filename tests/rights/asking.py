@@ -85,11 +85,29 @@ class Engine:
         return self.ask_bytes(request(command, data, user))
 
     def ask_bytes(self, body):
-        self.socket.sendall(struct.pack("=I", len(body)) + body)
-        length = self.stream.read(4)
-        if len(length) < 4:
+        self.send(body)
+        reply = self.receive_or_nothing()
+        if not reply:
             raise ConnectionError("the engine closed the connection")
-        return self.stream.read(struct.unpack("=I", length)[0])
+        return reply
+
+    def send(self, body):
+        self.socket.sendall(struct.pack("=I", len(body)) + body)
+
+    def receive_or_nothing(self):
+        """The next reply; b"" when the engine has closed the connection."""
+        try:
+            length = self.stream.read(4)
+            return self.stream.read(struct.unpack("=I", length)[0]) if len(length) == 4 else b""
+        except ConnectionError:
+            return b""
+
+    def answers(self, body):
+        try:
+            self.send(body)
+        except ConnectionError:
+            return False
+        return self.receive_or_nothing() != b""
 
     def pages(self, share, query, limit, user=None):
         """All that a query finds, page by page: the paths, as bytes, in order, and the total of the first page; None where
