@@ -44,7 +44,7 @@ void Serve() {
   options.request_limit_bytes = kRequestMaxBytes;
   options.requests_limit_bytes = 2ULL * kRequestMaxBytes;
   options.workers = kWorkers;
-  options.users = engine::LimitsOfUsers(engine::InstanceOwner());
+  options.users = engine::LimitsOfUsers(engine.InstanceOwner());
   services::FrameServer server(options, [&engine](const std::string& request, const services::Peer& peer) {
     return engine.Handle(request, peer);
   });

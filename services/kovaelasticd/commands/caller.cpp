@@ -1,14 +1,9 @@
 #include "services/kovaelasticd/commands/caller.h"
 
-#include <sys/stat.h>
 #include <unistd.h>
 
 #include <algorithm>
-#include <string>
 
-#include <kova/instance.h>
-
-#include "common/log.h"
 #include "services/kovaelasticd/commands/members.h"
 #include "services/kovaelasticd/commands/user_error.h"
 
@@ -31,14 +26,6 @@ uint32_t ReadId(const Json::Value& id, const char* name) {
 }
 
 }  // namespace
-
-uint32_t InstanceOwner() {
-  const std::string& root = kova::InstanceRoot();
-  struct stat folder = {};
-  FERROX_FAIL_IF(stat(root.empty() ? "/" : root.c_str(), &folder) != 0, Error::kInternal,
-                 "cannot tell whose instance this is: " + root + ": " + ErrnoText());
-  return folder.st_uid;
-}
 
 Caller CallerOf(const services::Peer& peer, uint32_t instance_owner) {
   Caller caller{peer.uid, {peer.groups.begin(), peer.groups.end()}, false};

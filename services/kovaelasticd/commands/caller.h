@@ -18,8 +18,6 @@ struct Caller {
   bool privileged = false;       ///< root, the owner of the instance, the engine's own user: sees and does everything
 };
 
-/// The owner of the instance's root folder. @throws Error kInternal when it cannot be read.
-uint32_t InstanceOwner();
 Caller CallerOf(const services::Peer& peer, uint32_t instance_owner);
 
 /// For whom an answer is, without a share yet: for the caller; or, when a privileged one asks "as" somebody else, for

@@ -11,6 +11,7 @@
 #include "services/kovaelasticd/commands/user_error.h"
 #include "services/kovaelasticd/commands/user_limits.h"
 #include "services/kovaelasticd/store/work_limit.h"
+#include "services/support/instance_owner.h"
 
 namespace ferrox::engine {
 
@@ -47,6 +48,13 @@ Json::Value& DataOf(Json::Value& part) {
   Json::Value& data = part["data"];
   if (data.isNull()) data = Json::Value(Json::objectValue);
   return data;
+}
+
+/// @throws Error kInternal.
+uint32_t OwnerOfInstance() {
+  const std::optional<uid_t> owner = services::InstanceOwner();
+  FERROX_FAIL_IF(!owner.has_value(), Error::kInternal, "cannot tell whose instance this is: " + ErrnoText());
+  return *owner;
 }
 
 /// Runs `run` and turns what it throws into a failure reply.
@@ -109,7 +117,7 @@ Json::Value SuccessReply(Json::Value data) {
 }
 
 Engine::Engine(const std::string& state_folder, LookFunction look)
-    : registry_(state_folder), instance_owner_(InstanceOwner()), look_(std::move(look)) {}
+    : registry_(state_folder), instance_owner_(OwnerOfInstance()), look_(std::move(look)) {}
 
 std::string Engine::Handle(const std::string& request, const services::Peer& peer) {
   const auto began = std::chrono::steady_clock::now();

@@ -29,6 +29,8 @@ class Engine {
   /// One request to one reply, whatever the request holds. What an ordinary user is told leaves at the next full kStep
   /// since the call, so that its time tells less of what others have.
   std::string Handle(const std::string& request, const services::Peer& peer);
+  /// Whose the instance is.
+  uint32_t InstanceOwner() const { return instance_owner_; }
 
  private:
   std::string Answer(const std::string& request, const Caller& caller);

@@ -98,12 +98,12 @@ Json::Value Find(const CommandCall& call, const std::string& path, bool with_tex
 Json::Value RunShow(CommandCall& call) {
   const std::string asked = CheckedPath("path", RequiredText(call.data, "path"));
   const std::string path = asked.substr(0, std::max<size_t>(1, asked.find_last_not_of('/') + 1));
-  const Json::Value document = Find(call, path, OptionalBool(call.data, "text", false));
+  Json::Value document = Find(call, path, OptionalBool(call.data, "text", false));
   if (document.isNull()) {
     throw UserError(Error::kEngineNoSuchDocument, "\"" + asked + "\" is not in the index, or you may not read it");
   }
   Json::Value result;
-  result["document"] = FieldsForUsers(document);
+  result["document"] = FieldsForUsers(std::move(document));
   return result;
 }
 

@@ -55,13 +55,14 @@ UserScope OpenScope(const CommandCall& call, const Asker& asker) {
   return scope;
 }
 
-Json::Value UserHitJson(const UserScope& scope, const IndexHit& found) {
+/// Takes the fields out of `found`.
+Json::Value UserHitJson(const UserScope& scope, IndexHit& found) {
   Json::Value hit;
   hit["doc_id"] = found.hit.path;
   hit["share"] = scope.indices[found.index].open.share->share;
   hit["score"] = found.hit.score;
   if (!found.hit.snippet.empty()) hit["snippet"] = found.hit.snippet;
-  hit["fields"] = FieldsForUsers(found.hit.fields);
+  hit["fields"] = FieldsForUsers(std::move(found.hit.fields));
   return hit;
 }
 
@@ -75,12 +76,11 @@ std::optional<int64_t> PreparedPercent(Index& index) {
 
 }  // namespace
 
-Json::Value FieldsForUsers(const Json::Value& fields) {
-  Json::Value shown(Json::objectValue);
+Json::Value FieldsForUsers(Json::Value fields) {
   for (const std::string& name : fields.getMemberNames()) {
-    if (name.starts_with(kShownPrefix)) shown[name] = fields[name];
+    if (!name.starts_with(kShownPrefix)) fields.removeMember(name);
   }
-  return shown;
+  return fields;
 }
 
 Registry::OpenIndex OpenForUser(const CommandCall& call, const EnteredShare& share) {
@@ -101,7 +101,7 @@ Json::Value SearchForUser(const CommandCall& call, const Asker& asker, const Sea
     throw UserError(Error::kEngineNotPermitted, "ordinary users name \"shares\", not indices");
   }
   UserScope scope = OpenScope(call, asker);
-  const LivePage page = SearchLivePage(
+  LivePage page = SearchLivePage(
       scope.indices, request, call.look,
       [&scope](const AskedIndex& index, const Error& error) { LeaveOutShare(scope, index.open.share->share, error); });
   for (const AskedIndex& index : scope.indices) {
@@ -112,7 +112,7 @@ Json::Value SearchForUser(const CommandCall& call, const Asker& asker, const Sea
   result["total"] = Json::Int64(page.found.total);
   result["next_offset"] = Json::Int64(page.next_offset);
   result["hits"] = Json::Value(Json::arrayValue);
-  for (const IndexHit& hit : page.found.hits) result["hits"].append(UserHitJson(scope, hit));
+  for (IndexHit& hit : page.found.hits) result["hits"].append(UserHitJson(scope, hit));
   result["left_out"] = std::move(scope.left_out);
   if (page.found.total == 0 && !page.found.suggestions.empty()) {
     result["suggestions"] = Vec2JsonArr(page.found.suggestions);

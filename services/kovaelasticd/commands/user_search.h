@@ -20,6 +20,6 @@ Json::Value SearchForUser(const CommandCall& call, const Asker& asker, const Sea
 Registry::OpenIndex OpenForUser(const CommandCall& call, const EnteredShare& share);
 
 /// A document's fields as ordinary users are shown them: none of what the engine or the index daemon keeps for itself.
-Json::Value FieldsForUsers(const Json::Value& fields);
+Json::Value FieldsForUsers(Json::Value fields);
 
 }  // namespace ferrox::engine
