@@ -20,9 +20,9 @@ constexpr char kHelp[] =
     "Tells the search engine which files a user may open now, by trying it with the ids of that user, in the\n"
     "foreground, until SIGTERM or SIGINT. FERROX_ROOT chooses the instance.\n";
 
-/// Requests that open files at a time, and of these below one share's folder: two file systems that do not answer leave
-/// room for others.
-constexpr unsigned kAtOnce = 24, kRootAtOnce = 8;
+/// Requests that open files at a time, and of these below one share's folder, which are as many as the engine can send:
+/// two file systems that do not answer leave room for others.
+constexpr unsigned kAtOnce = 40, kRootAtOnce = 16;
 /// For the questions about the daemon's state, which come while all others hang.
 constexpr unsigned kSpareThreads = 2;
 /// A client puts at most 1 MiB of paths into a request; JSON may write six bytes for one.

@@ -122,10 +122,10 @@ Engine::Engine(const std::string& state_folder, LookFunction look)
 std::string Engine::Handle(const std::string& request, const services::Peer& peer) {
   const auto began = std::chrono::steady_clock::now();
   const Caller caller = CallerOf(peer, instance_owner_);
-  std::optional<WorkLimit> limit;
-  if (!caller.privileged) limit.emplace(kUserWorkLongest);
   std::string text;
   const Json::Value failure = ReplyOf(caller, [&] {
+    std::optional<WorkLimit> limit;
+    if (!caller.privileged) limit.emplace(kUserWorkLongest);
     text = Answer(request, caller);
     return Json::Value();
   });
