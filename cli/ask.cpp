@@ -1,6 +1,5 @@
 #include "cli/ask.h"
 
-#include <algorithm>
 #include <future>
 
 #include "cli/caller.h"
@@ -8,8 +7,8 @@
 #include "cli/format.h"
 #include "cli/rights.h"
 #include "common/error.h"
-#include "common/file_util.h"
 #include "common/paths.h"
+#include "wire/await_changes.h"
 #include "wire/engine_requests.h"
 #include "wire/frame_client.h"
 
@@ -92,24 +91,6 @@ DaemonState StateOf(const Daemon& daemon) {
   return StateFrom(daemon, SendCommand(daemon, "status", Json::Value(), kStateWait));
 }
 
-/// @throws Failure also when the daemon's answer comes much too late.
-Json::Value Sync(const Daemon& daemon, Json::Value data, std::chrono::milliseconds longest) {
-  constexpr std::chrono::seconds kSlack(5);
-  data["timeout_ms"] = Json::Int64(longest.count());
-  return DataOf(daemon,
-                SendCommand(daemon, "sync", data, std::chrono::duration_cast<std::chrono::seconds>(longest) + kSlack));
-}
-
-/// Why the index daemon cannot say that the shares (none named: all) are up to date; "" when it does.
-std::string WhyBehind(const std::vector<std::string>& shares, std::chrono::milliseconds longest) try {
-  Json::Value data(Json::objectValue);
-  for (const std::string& share : shares) data["shares"].append(share);
-  (void)Sync(kIndexDaemon, data, longest);
-  return "";
-} catch (const Refusal& refusal) {
-  return refusal.Reason();
-}
-
 }  // namespace
 
 Json::Value AskEngine(const Json::Value& request, std::chrono::seconds longest) {
@@ -155,30 +136,17 @@ std::string NotNoticed() {
   return {};
 }
 
-/// First what the file systems have reported is in the queues, then what is in the queues is in the index. Only where
-/// that cannot be said of all shares together, each is asked for by itself.
 std::map<std::string, std::string> AwaitChanges(const std::vector<std::string>& shares, std::chrono::seconds longest) {
-  using std::chrono::milliseconds;
-  const auto end = std::chrono::steady_clock::now() + longest;
-  const auto left = [end] {
-    return std::max(std::chrono::duration_cast<milliseconds>(end - std::chrono::steady_clock::now()), milliseconds(0));
-  };
-  const Json::Value noticed = Sync(kNotificationDaemon, Json::Value(Json::objectValue), longest);
-  std::string problems;
-  for (const Json::Value& problem : noticed["problems"])
-    problems += (problems.empty() ? "" : "; ") + problem.asString();
-  if (!problems.empty()) throw Failure(problems);
-  const std::string refusal = WhyBehind(shares, left());
-  if (refusal.empty()) return {};
-  if (shares.empty()) throw Failure(std::string(kIndexDaemon.name) + ": " + refusal);
-  std::map<std::string, std::string> behind;
-  for (const std::string& share : shares) {
-    std::string reason = shares.size() == 1 ? refusal : WhyBehind({share}, left());
-    const std::string name = "share " + share + ": ";
-    if (StringStartWith(reason, name)) reason.erase(0, name.size());
-    if (!reason.empty()) behind[share] = reason;
+  wire::ChangesReport report = wire::AwaitChanges(shares, longest);
+  if (!report.not_noticed.empty()) throw Failure(report.not_noticed);
+  if (report.failed_socket == nullptr) return std::move(report.behind);
+  const Daemon& daemon = report.failed_socket == kNotifydSocket ? kNotificationDaemon : kIndexDaemon;
+  try {
+    (void)DataOf(daemon, std::move(report.failure));
+  } catch (const Refusal& refusal) {
+    throw Failure(refusal.what());
   }
-  return behind;
+  return {};
 }
 
 /// Waits less than for other commands: it is asked before anything is changed, so that giving up costs nothing.

@@ -19,6 +19,7 @@ std::string StateText(const Json::Value& share) {
   std::string text = state;
   if (state == "ready") text = "can be searched";
   if (state == "preparing") text = "is being prepared";
+  if (state == "indexing") text = "can be searched; is being indexed";
   if (state == "upgrading" || state == "rebuilding")
     text = "is being " + std::string(state == "upgrading" ? "upgraded" : "rebuilt");
   if (state == "refused" || state == "unavailable") text = "cannot be searched";

@@ -45,6 +45,7 @@ void Serve() {
   options.requests_limit_bytes = 2ULL * kRequestMaxBytes;
   options.workers = kWorkers;
   options.users = engine::LimitsOfUsers(engine.InstanceOwner());
+  options.on_stop = [&engine] { engine.EndWaits(); };
   services::FrameServer server(options, [&engine](const std::string& request, const services::Peer& peer) {
     return engine.Handle(request, peer);
   });

@@ -68,6 +68,35 @@ class UsersTest(InstanceTestCase):
             wait_for(lambda file=file: self.instance.search(f"lantern name:{file}"), file)
         return plans, vault
 
+    def ask_as(self, user, command, **data):
+        asker = {"uid": user.uid, "groups": list(user.groups)}
+        reply = self.instance.ask("kovaelasticd", {"command": command, "data": {"as": asker, **data}})
+        return reply["data"] if reply["success"] else reply["error"]
+
+    def test_users_learn_of_their_shares_whether_all_is_in_and_how_they_are(self):
+        self.ctl("up")
+        plans, secret = self.instance.add_share("plans"), self.instance.add_share("secret")
+        os.chmod(secret, 0o700)
+        for name in ("plans", "secret"):
+            wait_for(lambda: self.share_note(name), "the note")
+        states = [{"share": "plans", "state": "ready"}]
+        wait_for(lambda: self.ask_as(ANN, "shares") == states, "the state of the one that she may enter")
+        self.assertEqual(1404, self.ask_as(ANN, "fresh", shares=["secret"])["code"])
+        for i in range(5):
+            write(f"{plans}/{i}.txt", f"lantern{i}")
+            self.assertEqual({"behind": []}, self.ask_as(ANN, "fresh"))
+            self.assertEqual(1, self.ask_as(ANN, "search", query=f"lantern{i}")["total"])
+        self.ctl("pause")
+        write(f"{plans}/later.txt", "beacon")
+        write(f"{secret}/later.txt", "beacon")
+        self.assertEqual({"behind": ["plans"]}, self.ask_as(ANN, "fresh"))
+        self.instance.kill("kovanotifyd")
+        self.assertEqual("it cannot be said now whether all changes are included", self.ask_as(ANN, "fresh")["msg"])
+
+    def share_note(self, name):
+        with open(f"{self.instance.root}/var/lib/kova/kovaelasticd/indices.json", encoding="utf-8") as file:
+            return any(index.get("share", {}).get("share") == name for index in json.load(file).values())
+
     def test_files_of_the_service_tell_others_nothing(self):
         self.ctl("down")
         for folder in ("etc/kova", "var/packages/Ferrox/etc", "var/lib/kova/notifyd"):

@@ -32,6 +32,8 @@ constexpr Command kOtherCommands[] = {{"access_set", &RunAccessSet, Users::kPriv
                                       {"update_term_suggestion", &OnUpdateTermSuggestion, Users::kPrivileged},
                                       {"search", &RunSearch, Users::kEveryone},
                                       {"show", &RunShow, Users::kEveryone},
+                                      {"fresh", &RunFresh, Users::kEveryone},
+                                      {"shares", &RunShares, Users::kEveryone},
                                       {"ping", &OnPing, Users::kEveryone}};
 
 }  // namespace

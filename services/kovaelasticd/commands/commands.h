@@ -6,6 +6,7 @@
 #include <json/value.h>
 
 #include "services/kovaelasticd/commands/caller.h"
+#include "services/kovaelasticd/commands/daemon_relay.h"
 #include "services/kovaelasticd/commands/live_look.h"
 #include "services/kovaelasticd/indices/registry.h"
 
@@ -20,6 +21,7 @@ struct CommandCall {
   Registry& registry;
   const Caller& caller;
   const LookFunction& look;
+  DaemonRelay& relay;
   Json::Value& data;  ///< the request's "data", an object; the command may move values out of it
 };
 
@@ -67,6 +69,9 @@ Json::Value RunAccessSet(CommandCall& call);
 Json::Value RunSearch(CommandCall& call);
 /// The command "show" (show_command.cpp).
 Json::Value RunShow(CommandCall& call);
+/// The commands "fresh" and "shares" (relayed_commands.cpp).
+Json::Value RunFresh(CommandCall& call);
+Json::Value RunShares(CommandCall& call);
 
 /// {"success":false,"error":{"code":...,"msg":...}}
 Json::Value FailureReply(int code, const std::string& sentence);

@@ -163,7 +163,7 @@ std::string Engine::Answer(const std::string& request, const Caller& caller) {
 
 /// Who asks as an ordinary user is told of failures what that user is.
 Json::Value Engine::Run(const Command& command, const Caller& caller, Json::Value& part) {
-  CommandCall call{registry_, caller, look_, DataOf(part)};
+  CommandCall call{registry_, caller, look_, relay_, DataOf(part)};
   const bool as_user = command.users == Users::kEveryone && !call.data["as"].isNull();
   try {
     return SuccessReply(command.run(call));

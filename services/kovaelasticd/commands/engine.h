@@ -31,6 +31,8 @@ class Engine {
   std::string Handle(const std::string& request, const services::Peer& peer);
   /// Whose the instance is.
   uint32_t InstanceOwner() const { return instance_owner_; }
+  /// Ends the requests that wait for other daemons' work, and those to come, because the engine stops.
+  void EndWaits() { relay_.Fresh().End(); }
 
  private:
   std::string Answer(const std::string& request, const Caller& caller);
@@ -42,6 +44,7 @@ class Engine {
   Registry registry_;
   const uint32_t instance_owner_;
   const LookFunction look_;
+  DaemonRelay relay_{registry_};
 };
 
 }  // namespace ferrox::engine
