@@ -29,6 +29,7 @@ if [[ ! -e /srv/docs ]]; then
   fileindexctl share add /srv/docs
   expect active active active active
   finds lantern
+  fileindexctl search --as 50001:50001 lantern
   echo lighthouse >/srv/docs/b.txt
   finds lighthouse
   fileindexctl status
