@@ -1,6 +1,7 @@
 #include "services/kovaelasticd/store/places.h"
 
-#include <cstring>
+#include <algorithm>
+#include <cstddef>
 
 #include "services/kovaelasticd/store/folder_tree.h"
 #include "services/kovaelasticd/store/packed_numbers.h"
@@ -16,15 +17,25 @@ uint64_t JoinKeys(uint64_t above, uint64_t name) {
   return key ^ key >> 32;
 }
 
-/// CutSigned, with a short way for the common numbers of one byte.
-bool CutStep(std::string_view& bytes, int64_t& step) {
-  if (bytes.empty() || static_cast<unsigned char>(bytes.front()) >= 0x80) return CutSigned(bytes, step);
-  step = Unzigzag(static_cast<unsigned char>(bytes.front()));
-  bytes.remove_prefix(1);
-  return true;
+/// Adds the next difference to `number`; with a short way for the common ones of one byte.
+inline bool CutStep(std::string_view& bytes, uint32_t& number) {
+  if (!bytes.empty() && static_cast<unsigned char>(bytes.front()) < 0x80) {
+    number += static_cast<uint32_t>(Unzigzag(static_cast<unsigned char>(bytes.front())));
+    bytes.remove_prefix(1);
+    return true;
+  }
+  int64_t step = 0;
+  const bool whole = CutSigned(bytes, step);
+  number += static_cast<uint32_t>(step);
+  return whole;
 }
 
 constexpr size_t kNameBytes = sizeof(uint32_t);
+
+inline uint32_t NameBytes(const char* bytes) {
+  const auto byte = [bytes](size_t i) { return uint32_t{static_cast<unsigned char>(bytes[i])}; };
+  return byte(0) | byte(1) << 8 | byte(2) << 16 | byte(3) << 24;
+}
 
 }  // namespace
 
@@ -57,25 +68,23 @@ std::string PackPlaces(const PlaceList::Part& part) {
 }
 
 bool UnpackPlaces(std::string_view packed, PlaceList::Part& part) {
-  int64_t folder = 0, access = 0;
+  uint32_t folder = 0, access = 0;
   size_t i = 0;
-  part = {};
   for (; !packed.empty() && i < part.places.size(); ++i) {
-    int64_t folder_step = 0, access_step = 0;
-    if (!CutStep(packed, folder_step) || !CutStep(packed, access_step)) return false;
-    folder += folder_step;
-    access += access_step;
+    if (!CutStep(packed, folder) || !CutStep(packed, access)) return false;
     Place& place = part.places[i];
-    place.folder = static_cast<uint32_t>(folder);
-    place.access = static_cast<uint32_t>(access) & Place::kAccessMax;
+    place.folder = folder;
+    place.access = access & Place::kAccessMax;
+    place.length = 0;
+    part.names[i] = 0;
     if (folder == 0) continue;
     if (packed.size() < 1 + kNameBytes) return false;
     place.length = static_cast<uint8_t>(packed[0]);
-    for (size_t byte = kNameBytes; byte > 0; --byte) {
-      part.names[i] = part.names[i] << 8 | static_cast<unsigned char>(packed[byte]);
-    }
+    part.names[i] = NameBytes(packed.data() + 1);
     packed.remove_prefix(1 + kNameBytes);
   }
+  std::fill(part.places.begin() + static_cast<ptrdiff_t>(i), part.places.end(), Place());
+  std::fill(part.names.begin() + static_cast<ptrdiff_t>(i), part.names.end(), 0);
   return packed.empty();
 }
 
@@ -114,7 +123,7 @@ std::shared_ptr<const Places> Places::Load(Database& database, int64_t version, 
   changed.Bind(1, places->version_);
   bool other_folders = before == nullptr;
   while (changed.Step()) {
-    const auto part = std::make_shared<PlaceList::Part>();
+    const auto part = std::make_shared_for_overwrite<PlaceList::Part>();
     if (!UnpackPlaces(changed.Text(2), *part)) database.Fail(SQLITE_CORRUPT);
     const auto number = static_cast<size_t>(changed.Int(0));
     const bool is_folders = number % 2 != 0;

@@ -60,7 +60,7 @@ class ReadableDocuments {
   std::vector<uint8_t> permissions_;  ///< by the number of the record; number 0 is none, and gives none
   int64_t root_document_ = -1;        ///< its own document; -1: there is none
   bool root_counts_ = false;          ///< it is readable
-  std::vector<uint64_t> open_;        ///< a bit for each folder
+  std::vector<uint64_t> open_;        ///< a bit for each folder; never that of number 0
   DocSet documents_;
   Sums sums_;
   std::vector<Sums> parts_;  ///< of each part of the places

@@ -17,7 +17,6 @@ Visible::Visible(StoreReader& reader, const Asker* asker)
   if (reader.tree.IsFlat()) return;  // files of that format have no access records
   places_ = reader.places.Load(reader.database, version_);
   readable_ = reader.readable.Load(reader.database, reader.tree, *places_, *asker);
-  keys_.emplace(*places_);
   documents_ = readable_->Count();
   with_content_ = readable_->WithContent();
   text_bytes_ = readable_->TextBytes();

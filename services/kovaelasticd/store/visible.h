@@ -16,7 +16,7 @@ struct StoreReader;
 
 /// The documents that exist for one search: for an ordinary user those that they may read, else all but those that are
 /// deleted and still in the tables. Every set and every hit of a search goes through this one before it is counted, so
-/// that nothing else tells of other documents. For one snapshot.
+/// that nothing else tells of other documents. For one snapshot and one thread.
 class Visible {
  public:
   /// `reader`, which must outlive this, has a transaction open. `asker`: null for who may see everything.
@@ -41,7 +41,11 @@ class Visible {
   /// documents. PathKey decides in their place.
   bool IsForAsker() const { return for_asker_; }
   /// PathKeys; for an asker only.
-  uint64_t PathKey(int64_t id) const { return keys_.has_value() ? keys_->Of(id) : 0; }
+  uint64_t PathKey(int64_t id) const {
+    if (places_ == nullptr) return 0;
+    if (!keys_.has_value()) keys_.emplace(*places_);
+    return keys_->Of(id);
+  }
 
  private:
   StoreReader& reader_;
@@ -49,7 +53,7 @@ class Visible {
   const DocSet* const hidden_;
   std::shared_ptr<const Places> places_;
   std::shared_ptr<const ReadableDocuments> readable_;  ///< null for an asker: nothing is readable
-  std::optional<PathKeys> keys_;
+  mutable std::optional<PathKeys> keys_;               ///< once they are needed
   int64_t documents_ = 0, with_content_ = 0, text_bytes_ = 0, version_ = 0;
 };
 
