@@ -82,13 +82,21 @@ def flood(asking, instance, connections, ready):
             os.write(ready.pop(), b".")
         for key, _ in selector.select(0.1):
             engine = key.data
-            reply = engine.receive_or_nothing()
-            answer = asking.parse(reply) if reply else None
-            outcomes["closed" if not reply else "found" if answer["success"] else answer["error"]["code"]] += 1
-            if not reply or not send_next(asking, engine, rng):
+            outcome = outcome_of(asking, engine)
+            outcomes[outcome] += 1
+            if outcome == "closed" or not send_next(asking, engine, rng):
                 selector.unregister(engine.socket)
                 engine.close()
     return dict(outcomes)
+
+
+def outcome_of(asking, engine):
+    """A newer connection may take this one's place also in the middle of a reply."""
+    try:
+        answer = asking.parse(engine.receive_or_nothing())
+    except ValueError:
+        return "closed"
+    return "found" if answer["success"] else answer["error"]["code"]
 
 
 def send_next(asking, engine, rng):
