@@ -132,6 +132,8 @@ void PrintShare(const Json::Value& share, const std::string& notification_proble
   PrintWork(share);
   (void)fputs(WatchLines(share, notification_problem).c_str(), stdout);
   PrintIndex(share);
+  const std::string refused = TextOf(share, "refused");
+  if (!refused.empty()) (void)printf("    not searched by ordinary users: %s\n", EscapeForTerminal(refused).c_str());
   PrintQueued(share);
   PrintMissing(share);
 }
