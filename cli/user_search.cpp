@@ -21,6 +21,7 @@ using std::chrono::milliseconds;
 using std::chrono::seconds;
 
 constexpr seconds kLongestAnswer(20);  ///< somebody waits at a terminal
+constexpr seconds kFreshMax(60);       ///< the engine waits no longer for users
 constexpr seconds kSlack(5);           ///< of the engine, when it waits itself
 
 constexpr char kNotAllNoticed[] =
@@ -32,10 +33,12 @@ bool Contains(const std::vector<std::string>& names, const std::string& name) {
   return std::find(names.begin(), names.end(), name) != names.end();
 }
 
-/// Those that the calling user may enter.
-std::vector<std::string> AllShares() {
+/// Those that the user may enter: who calls, or whom `as` names.
+std::vector<std::string> AllShares(const Json::Value& as) {
+  Json::Value data(Json::objectValue);
+  if (!as.isNull()) data["as"] = as;
   std::vector<std::string> names;
-  for (const Json::Value& share : AskEngine(wire::EngineRequest("shares"), kLongestAnswer)) {
+  for (const Json::Value& share : AskEngine(wire::EngineRequest("shares", data), kLongestAnswer)) {
     names.push_back(TextOf(share, "share"));
   }
   return names;
@@ -48,9 +51,11 @@ Json::Value NamesAsJson(const std::vector<std::string>& names) {
 }
 
 /// Waits until all that was changed before can be found. @return the shares of which that cannot be said.
-std::vector<std::string> AwaitFresh(const std::vector<std::string>& shares, seconds longest) {
+std::vector<std::string> AwaitFresh(const std::vector<std::string>& shares, const Json::Value& as, seconds longest) {
+  longest = std::min(longest, kFreshMax);
   Json::Value data(Json::objectValue);
   if (!shares.empty()) data["shares"] = NamesAsJson(shares);
+  if (!as.isNull()) data["as"] = as;
   data["timeout_ms"] = Json::Int64(milliseconds(longest).count());
   std::vector<std::string> behind;
   const Json::Value reply = AskEngine(wire::EngineRequest("fresh", data), longest + kSlack);
@@ -60,14 +65,13 @@ std::vector<std::string> AwaitFresh(const std::vector<std::string>& shares, seco
 
 /// Takes the shares that are behind out of `shares`, where none means all; what they hold by now may do.
 /// @return whether there is anything left to be searched.
-bool MakeUserFresh(const Arguments& arguments, std::vector<std::string>& shares, Found& found) {
-  const std::vector<std::string> behind = AwaitFresh(shares, FreshWait(arguments));
+bool MakeUserFresh(const Arguments& arguments, const Json::Value& as, std::vector<std::string>& shares, Found& found) {
+  const std::vector<std::string> behind = AwaitFresh(shares, as, FreshWait(arguments));
   const bool stale_will_do = arguments.Has("--partial");
   found.stale = !behind.empty();
   for (const std::string& share : behind) found.left_out.AddForUser(share, 0, kMayBeBehind, stale_will_do);
   if (stale_will_do || behind.empty()) return true;
-  // All that somebody else may enter is not known here.
-  if (shares.empty() && !arguments.Has("--as")) shares = AllShares();
+  if (shares.empty()) shares = AllShares(as);
   shares.erase(std::remove_if(shares.begin(), shares.end(),
                               [&behind](const std::string& share) { return Contains(behind, share); }),
                shares.end());
@@ -103,10 +107,11 @@ void SearchShares(Json::Value data, const std::vector<std::string>& shares, Foun
 int RunUserSearch(const Arguments& arguments) {
   Found found;
   Json::Value data = SearchMembers(arguments);
-  if (arguments.Has("--as")) data["as"] = ToJson(UserOf(arguments));
+  const Json::Value as = arguments.Has("--as") ? ToJson(UserOf(arguments)) : Json::Value();
+  if (!as.isNull()) data["as"] = as;
   std::vector<std::string> shares = arguments.All("--share");
   try {
-    found.searched = !arguments.Has("--fresh") || MakeUserFresh(arguments, shares, found);
+    found.searched = !arguments.Has("--fresh") || MakeUserFresh(arguments, as, shares, found);
   } catch (const Failure& failure) {
     const bool goes_on = arguments.Has("--partial");
     Warn(failure.what());
