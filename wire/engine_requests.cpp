@@ -119,6 +119,8 @@ Json::Value DeleteDocumentRequest(const std::string& index_id, const std::string
 /// The slash keeps out the folder itself, and its neighbours whose names begin with its own.
 Json::Value AllBelow(const std::string& folder) { return Object("prefix", Object(field::kKOVAMDPath, folder + "/")); }
 
+Json::Value DirectlyIn(const std::string& folder) { return Object("term", Object(field::kKOVAMDParent, folder)); }
+
 Json::Value OnlyAt(const std::string& path) { return Object("term", Object(field::kKOVAMDPath, path)); }
 
 Json::Value Unread() { return Object("unread", true); }
@@ -141,6 +143,16 @@ Json::Value FindDocumentsRequest(const std::string& index_id, DocumentQuery quer
   for (const std::string& name : query.fields) sent["load_field"].append(name);
   if (query.limit > 0) sent["limit"] = query.limit;
   if (!query.after.empty()) sent["after"] = query.after;
+  return request;
+}
+
+Json::Value FolderDigestsRequest(const std::string& index_id, const std::string& path, const std::string& after,
+                                 uint64_t seed) {
+  Json::Value request = IndexRequest("folder_digests", index_id);
+  Json::Value& data = request["data"];
+  data["path"] = path;
+  if (!after.empty()) data["after"] = after;
+  data["seed"] = Json::UInt64(seed);
   return request;
 }
 

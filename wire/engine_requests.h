@@ -65,6 +65,7 @@ Json::Value DeleteDocumentRequest(const std::string& index_id, const std::string
 
 /// What documents a request is about: the value of "qsl".
 Json::Value AllBelow(const std::string& folder);  ///< not the folder's own document
+Json::Value DirectlyIn(const std::string& folder);
 Json::Value OnlyAt(const std::string& path);
 Json::Value Unread();                     ///< those whose content could not be read, or not all of it
 Json::Value OfFileNumber(uint64_t file);  ///< those of the file of that inode number
@@ -80,6 +81,11 @@ struct DocumentQuery {
   std::string after = {};                ///< only paths behind this one; "": from the first
 };
 Json::Value FindDocumentsRequest(const std::string& index_id, DocumentQuery query);
+
+/// The folders at and below `path` that have documents directly in them, with digests of these (folder_digest.h), in
+/// byte order of their paths with a "/" at the end, those behind `after`; "": from the first.
+Json::Value FolderDigestsRequest(const std::string& index_id, const std::string& path, const std::string& after,
+                                 uint64_t seed);
 
 // Others.
 

@@ -19,13 +19,6 @@ namespace {
 
 constexpr unsigned kRemovedAtOnce = 1000;
 
-/// Whether the content may be readable that was not when the document was written. A file that broke its reader is not
-/// tried again by the same one.
-bool IsWorthAnotherTry(const IndexedEntry& indexed) {
-  return indexed.with_content && (indexed.extract_failed || indexed.extract_version == 0) &&
-         indexed.extract_version < ExtractVersion(indexed.content_type);
-}
-
 /// Whether the content was found to be of another type than the name suggests. A refresh of the attributes alone would
 /// put the name's type in its place.
 bool DiffersFromNameType(const IndexedEntry& indexed, const std::string& path) {
@@ -47,9 +40,15 @@ bool DocumentWriter::LacksAccessAlone(const IndexedEntry& indexed, const struct 
   return SameContent(indexed.stamp, Stamp(status)) && HoldsContentAsWanted(indexed, status);
 }
 
+/// A file that broke its reader is not tried again by the same one.
+bool DocumentWriter::IsWorthAnotherTry(const UnreadContent& unread) {
+  return unread.version < ExtractVersion(unread.type);
+}
+
 bool DocumentWriter::HoldsContentAsWanted(const IndexedEntry& indexed, const struct stat& status) const {
+  const bool unread = indexed.with_content && (indexed.extract_failed || indexed.extract_version == 0);
   return indexed.with_content == WantsContent(indexed.path, status) && !indexed.cut_without_reason &&
-         !IsWorthAnotherTry(indexed);
+         !(unread && IsWorthAnotherTry({indexed.content_type, indexed.extract_version}));
 }
 
 void DocumentWriter::Write(const std::string& path) {

@@ -28,6 +28,10 @@ class DocumentWriter {
   /// Whether the document needs nothing: it has the stamp of the file's present state and a record of its rights, and
   /// holds its content exactly when that is wanted and as well as the present readers can read it.
   bool IsCurrent(const IndexedEntry& indexed, const struct stat& status) const;
+  /// Whether the content of the file at `path` is to be in its document.
+  bool WantsContent(const std::string& path, const struct stat& status) const;
+  /// Whether content that was not read, or not all of it, by that version may be readable now.
+  static bool IsWorthAnotherTry(const UnreadContent& unread);
   /// Whether nothing is wrong with the document but its rights and what comes with these, so that RecordAccess makes it
   /// current.
   bool LacksAccessAlone(const IndexedEntry& indexed, const struct stat& status) const;
@@ -61,7 +65,6 @@ class DocumentWriter {
 
  private:
   bool HoldsContentAsWanted(const IndexedEntry& indexed, const struct stat& status) const;
-  bool WantsContent(const std::string& path, const struct stat& status) const;
   void RecordChangedSince(const struct stat& before, const std::string& access, const std::string& path);
   void RecordFailure(const Error& error, const std::string& path);
 

@@ -30,6 +30,17 @@ IndexedEntry ToEntry(const Json::Value& fields) {
   return entry;
 }
 
+FolderState ToFolder(const Json::Value& fields) {
+  FolderState folder;
+  GetJsonValue(folder.path, fields, "path", true);
+  if (fields["digest"].isUInt64()) folder.digest = fields["digest"].asUInt64();
+  for (const Json::Value& unread : fields["unread"]) {
+    GetJsonValue(folder.unread.emplace_back().type, unread, "type", true);
+    GetJsonValue(folder.unread.back().version, unread, "version", true);
+  }
+  return folder;
+}
+
 std::vector<size_t> Positions(const Json::Value& list, size_t end) {
   std::vector<size_t> positions;
   for (const Json::Value& position : list) {
@@ -122,6 +133,22 @@ class Engine : public ShareIndex {
 
   std::vector<IndexedEntry> List(const std::string& folder, const std::string& after, unsigned limit) override {
     return Query(wire::AllBelow(folder), limit, after);
+  }
+
+  std::vector<IndexedEntry> ListIn(const std::string& folder, const std::string& after, unsigned limit) override {
+    return Query(wire::DirectlyIn(folder), limit, after);
+  }
+
+  FolderPage Folders(const std::string& folder, const std::string& after, uint64_t seed) override {
+    Json::Value reply;
+    elastic::SendRequest(reply, wire::FolderDigestsRequest(id_, folder, after, seed));
+    const Json::Value& folders = reply["data"]["folders"];
+    FERROX_FAIL_IF(!folders.isArray(), Error::kBadEngineReply, toString(reply));
+    FolderPage page;
+    page.folders.reserve(folders.size());
+    for (const Json::Value& fields : folders) page.folders.push_back(ToFolder(fields));
+    page.more = reply["data"].isMember("more") && !page.folders.empty();
+    return page;
   }
 
   std::vector<IndexedEntry> Find(const std::string& path) override { return Query(wire::OnlyAt(path), 1, ""); }

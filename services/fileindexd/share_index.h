@@ -4,6 +4,7 @@
 #include <cstddef>
 #include <cstdint>
 #include <memory>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -29,6 +30,24 @@ struct IndexedEntry {
 struct AccessGaps {
   std::vector<size_t> differing;  ///< the document is of another content than the file
   std::vector<size_t> missing;    ///< there is no document
+};
+
+/// Of a document whose content was wanted, and was not read or not all of it: its type, and the version of what read
+/// it.
+struct UnreadContent {
+  std::string type;
+  int version = 0;
+};
+
+/// The documents directly in a folder.
+struct FolderState {
+  std::string path;
+  std::optional<uint64_t> digest = {};     ///< of them (wire::FolderDigest); nothing: there are too many
+  std::vector<UnreadContent> unread = {};  ///< of them, each kind once
+};
+struct FolderPage {
+  std::vector<FolderState> folders;
+  bool more = false;  ///< there may be folders behind the last
 };
 
 /// One share's index, as the daemon's work needs it. The one implementation asks the engine over its socket; tests have
@@ -73,6 +92,11 @@ class ShareIndex {
   virtual void Commit() = 0;
   /// At most `limit` documents below `folder`, in byte order of their paths, those after `after` when it is not "".
   virtual std::vector<IndexedEntry> List(const std::string& folder, const std::string& after, unsigned limit) = 0;
+  /// The same for those directly in `folder`.
+  virtual std::vector<IndexedEntry> ListIn(const std::string& folder, const std::string& after, unsigned limit) = 0;
+  /// The folders at and below `folder` that have documents directly in them, in byte order of their paths with a "/" at
+  /// the end, those behind `after` when it is not "".
+  virtual FolderPage Folders(const std::string& folder, const std::string& after, uint64_t seed) = 0;
   /// The document at `path`; none or one.
   virtual std::vector<IndexedEntry> Find(const std::string& path) = 0;
   /// At most `limit` documents, in byte order of their paths from behind `after`, of files with several names that

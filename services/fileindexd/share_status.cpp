@@ -64,9 +64,9 @@ void ShareStatus::EndComparison() {
   comparison_.End(SteadyMilliseconds());
 }
 
-void ShareStatus::FileExamined() {
+void ShareStatus::FileExamined(uint64_t count) {
   const base::MutexLock lock(mutex_);
-  ++comparison_.examined;
+  comparison_.examined += count;
 }
 
 void ShareStatus::SetEstimate(uint64_t files, bool complete) {

@@ -40,7 +40,7 @@ class ShareStatus {
   /// A comparison of disk and index begins, or ends. The figures of the last one stay.
   void BeginComparison(const std::string& path);
   void EndComparison();
-  void FileExamined();
+  void FileExamined(uint64_t count = 1);
   void SetEstimate(uint64_t files, bool complete);
 
   void DocumentsWritten(uint64_t count = 1);

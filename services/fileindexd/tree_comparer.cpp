@@ -124,6 +124,11 @@ ComparisonActions TreeComparer::Actions(const std::string& folder) {
     if (is_current || lacks_access) status.FileExamined();
     return is_current || lacks_access;
   };
+  actions.wants_content = [this](const std::string& path, const struct stat& file) {
+    return writer_.WantsContent(path, file);
+  };
+  actions.is_worth_another_try = &DocumentWriter::IsWorthAnotherTry;
+  actions.are_current = [&status](uint64_t documents) { status.FileExamined(documents); };
   actions.write = [this, &status](const std::string& path, const struct stat&) {
     tasks_.Submit([&writer = writer_, &status, path] {
       writer.Write(path);

@@ -27,11 +27,13 @@ struct TreeWalk::Level {
   base::UniqueFd folder;
   dev_t device = 0;
   bool indexed = false;  ///< the folder, and so all in it; else it is on the way to what is
+  bool entered = false;  ///< has been returned
   std::string prefix;
   std::string names;
-  std::vector<Item> items;
+  std::vector<Item> items;  ///< first the names, then those below
   size_t next = 0;
-  std::set<std::string> not_entered;
+  uint64_t links_examined = 0;
+  std::set<std::string, std::less<>> not_entered;
 
   std::string Name(const Item& item) const {
     return names.substr(item.offset, item.length - static_cast<size_t>(item.below));
@@ -73,13 +75,18 @@ bool TreeWalk::Next(Entry& entry) {
   }
   while (!levels_.empty()) {
     Level& level = *levels_.back();
+    if (!level.entered) {
+      level.entered = true;
+      entry = {Entry::Kind::kEntered, level.prefix.substr(0, level.prefix.size() - 1), {}};
+      return true;
+    }
     if (level.next == level.items.size()) {
       levels_.pop_back();
       continue;
     }
     const Item item = level.items[level.next++];
     if (!item.below) {
-      if (Examine(level, item, entry)) return true;
+      if (Find(level, item, entry)) return true;
       continue;
     }
     const std::string name = level.Name(item);
@@ -147,12 +154,19 @@ void TreeWalk::ReadNames(Level& level) {
   const int error = errno;
   const std::string_view names = level.names;
   std::sort(level.items.begin(), level.items.end(), [names](const Item& left, const Item& right) {
+    if (left.below != right.below) return right.below;
     return names.substr(left.offset, left.length) < names.substr(right.offset, right.length);
   });
   errno = error;
 }
 
-bool TreeWalk::Examine(Level& level, const Item& item, Entry& entry) {
+bool TreeWalk::MayEnter(Level& level, std::string_view name, const std::string& path, const struct stat& status) {
+  if (rules_.may_enter(path, status, level.device)) return true;
+  level.not_entered.emplace(name);
+  return false;
+}
+
+bool TreeWalk::Find(Level& level, const Item& item, Entry& entry) {
   const std::string name = level.Name(item);
   std::string path = level.prefix + name;
   const Place place = PlaceIn(level, path);
@@ -169,13 +183,40 @@ bool TreeWalk::Examine(Level& level, const Item& item, Entry& entry) {
     ++links_skipped_;
     return false;
   }
-  if (S_ISDIR(status.st_mode) && !rules_.may_enter(path, status, level.device)) {
-    level.not_entered.insert(name);
-    return false;
-  }
+  if (S_ISDIR(status.st_mode) && !MayEnter(level, name, path, status)) return false;
   if (place == Place::kOnTheWay) return false;
   entry = {Entry::Kind::kFound, std::move(path), status};
   return true;
+}
+
+bool TreeWalk::Examine(
+    const std::function<void(std::string_view name, const std::string& path, const struct stat&)>& take) {
+  Level& level = *levels_.back();
+  std::string path = level.prefix;
+  level.links_examined = 0;
+  for (const Item& item : level.items) {
+    if (item.below) break;
+    path.resize(level.prefix.size());
+    path.append(level.names, item.offset, item.length);
+    const char* const name = path.c_str() + level.prefix.size();
+    const Place place = PlaceIn(level, path);
+    if (place == Place::kOutside) continue;
+    struct stat status = {};
+    if (fstatat(level.folder.Get(), name, &status, AT_SYMLINK_NOFOLLOW) != 0) return false;
+    if (S_ISLNK(status.st_mode)) {
+      ++level.links_examined;
+      continue;
+    }
+    if (S_ISDIR(status.st_mode) && !MayEnter(level, name, path, status)) continue;
+    if (place == Place::kIndexed) take({name, item.length}, path, status);
+  }
+  return true;
+}
+
+void TreeWalk::SkipEntries() {
+  Level& level = *levels_.back();
+  while (level.next < level.items.size() && !level.items[level.next].below) ++level.next;
+  links_skipped_ += level.links_examined;
 }
 
 }  // namespace ferrox::indexd

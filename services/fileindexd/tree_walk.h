@@ -6,6 +6,7 @@
 #include <functional>
 #include <memory>
 #include <string>
+#include <string_view>
 #include <vector>
 
 #include "services/fileindexd/share_folders.h"
@@ -21,20 +22,21 @@ struct WalkRules {
   };
   /// Whether a name is never indexed, nor anything below it.
   std::function<bool(const std::string& name)> skip_name = [](const std::string&) { return false; };
-  /// Whether a folder found below one on the device `parent_device` may be entered; asked once per folder.
+  /// Whether a folder found below one on the device `parent_device` may be entered; asked at each look at the folder.
   std::function<bool(const std::string& path, const struct stat& status, dev_t parent_device)> may_enter =
       [](const std::string&, const struct stat&, dev_t) { return true; };
   /// Called for what could not be read, with errno's value.
   std::function<void(const std::string& path, int error)> on_problem = [](const std::string&, int) {};
 };
 
-/// Walks a folder in the byte order of full paths, the order in which the index lists its documents: the entries of a
-/// folder are sorted by name, and what lies in a subfolder sorts as if the subfolder's name ended in "/". Links are not
+/// Walks a folder in the order in which the index lists the folders in it: first what is directly in a folder, by the
+/// bytes of names, then what is in its subfolders, which are sorted as if their names ended in "/". Links are not
 /// followed and not returned. Holds an open descriptor and the names of one folder for each level of the tree.
 class TreeWalk {
  public:
   struct Entry {
     enum class Kind {
+      kEntered,       ///< the folder `path` was read: its entries follow
       kFound,         ///< a file or folder, as `status` says
       kUnknown,       ///< the system could not examine `path`: nothing is known of it
       kUnknownBelow,  ///< the system could not read the folder `path`: nothing is known of what is in it
@@ -44,7 +46,7 @@ class TreeWalk {
     struct stat status = {};
   };
 
-  /// What lies below `folder`; the folder itself is not returned. The rules must outlive the walk.
+  /// What lies below `folder`; the folder itself is entered, but not found. The rules must outlive the walk.
   TreeWalk(const std::string& folder, const WalkRules& rules);
   TreeWalk(const TreeWalk&) = delete;
   TreeWalk& operator=(const TreeWalk&) = delete;
@@ -52,6 +54,12 @@ class TreeWalk {
 
   /// False at the end; `entry` is then as it was.
   bool Next(Entry& entry);
+
+  /// Looks at all entries that Next would find directly in the folder that was just entered, in their order, and does
+  /// not go on; problems are not reported. False when something could not be examined. `take` gets name and path.
+  bool Examine(const std::function<void(std::string_view name, const std::string& path, const struct stat&)>& take);
+  /// Goes on behind the entries of the folder that was just entered, of which Examine has seen all.
+  void SkipEntries();
 
   /// Whether the folder itself could be read.
   bool Opened() const { return opened_; }
@@ -66,7 +74,8 @@ class TreeWalk {
   bool Descend(int parent_fd, const std::string& name, const std::string& path, bool indexed, Entry& entry);
   void ReadNames(Level& level);
   /// True when `entry` is to be returned.
-  bool Examine(Level& level, const Item& item, Entry& entry);
+  bool Find(Level& level, const Item& item, Entry& entry);
+  bool MayEnter(Level& level, std::string_view name, const std::string& path, const struct stat& status);
 
   const WalkRules& rules_;
   std::vector<std::unique_ptr<Level>> levels_;

@@ -1,13 +1,16 @@
 // Catches documents that are not found by a part of theirs, or found when they are gone or not committed.
 #include <map>
 #include <memory>
+#include <set>
 #include <string>
+#include <tuple>
 
 #include <gtest/gtest.h>
 
 #include "services/kovaelasticd/store/work_limit.h"
 #include "tests/engine/store_helpers.h"
 #include "tests/support/temp_dir.h"
+#include "wire/folder_digest.h"
 
 namespace ferrox::engine {
 namespace {
@@ -401,6 +404,31 @@ TEST_F(IndexStoreTest, WorkThatTakesTooLongEndsAndTheNextSearchRunsOn) {
     EXPECT_EQ(Error::kEngineUserBusy, code([&] { (void)FindPaths(*store_, "word"); }));
   }
   EXPECT_EQ("/v/a", FindPaths(*store_, "word"));
+}
+
+TEST(FolderDigestTest, TellsDocumentsApartInNameStampMarksAndOrder) {
+  using Documents = std::vector<std::tuple<const char*, const char*, unsigned>>;
+  std::set<uint64_t> values;
+  const Documents lists[] = {{},
+                             {{"", "", 0}},
+                             {{"", "", 0}, {"", "", 0}},
+                             {{"a", "1", 0}},
+                             {{"a", "1", 1}},
+                             {{"a1", "", 0}},
+                             {{"", "a1", 0}},
+                             {{"a", "1", 0}, {"b", "2", 0}},
+                             {{"b", "2", 0}, {"a", "1", 0}},
+                             {{"a", "2", 0}, {"b", "1", 0}},
+                             {{"a", "1b2", 0}},
+                             {{"longer than a word", "1.2.3.4", 0}},
+                             {{"longer than a worD", "1.2.3.4", 0}}};
+  for (const uint64_t seed : {0, 1}) {
+    for (const Documents& documents : lists) {
+      wire::FolderDigest digest(seed);
+      for (const auto& [name, stamp, marks] : documents) digest.Add(name, stamp, marks);
+      EXPECT_TRUE(values.insert(digest.Value()).second);
+    }
+  }
 }
 
 }  // namespace

@@ -12,6 +12,7 @@
 #include "services/kovaelasticd/store/length_class.h"
 #include "tests/engine/store_helpers.h"
 #include "tests/support/temp_dir.h"
+#include "wire/folder_digest.h"
 
 namespace ferrox::engine {
 namespace {
@@ -102,6 +103,48 @@ class StoreModel {
     store_->Get(request, [&](const Json::Value& entry) { listed.push_back(entry["KOVAMDPath"].asString()); });
     ASSERT_EQ(expected, listed) << "behind " << unread_after_;
     unread_after_ = listed.size() < 2 ? "" : listed.back();
+  }
+
+  /// The digests of the folders below some folder, in short pages, and each time the documents in one of these.
+  void CheckDigests() {
+    DigestRequest request = {Path() + "/", "", random_(), int64_t(1 + random_() % 3), 2, int64_t(1 + random_() % 9)};
+    std::map<std::string, wire::FolderDigest> expected;
+    std::map<std::string, std::vector<std::string>> documents;
+    for (const auto& [path, file] : files_) {
+      const std::string folder = path.substr(0, path.rfind('/') + 1);
+      if (!folder.starts_with(request.path)) continue;
+      const unsigned marks =
+          (file.access.empty() ? wire::FolderDigest::kNoAccess : 0U) |
+          (file.is_unread ? wire::FolderDigest::kWithContent : wire::FolderDigest::kCutWithoutReason);
+      wire::FolderDigest& digest = expected.try_emplace(folder, request.seed).first->second;
+      digest.Add(path.substr(folder.size()), file.Stamp(), marks);
+      documents[folder].push_back(path);
+    }
+    auto at = expected.begin();
+    for (bool more = true; more;) {
+      const DigestPage page = store_->Digests(request);
+      for (const FolderState& folder : page.folders) {
+        ASSERT_NE(at, expected.end()) << folder.path;
+        ASSERT_EQ(at->first, folder.path);
+        const bool few = at->second.Count() <= 2;
+        ASSERT_EQ(few ? std::optional(at->second.Value()) : std::nullopt, folder.digest) << folder.path;
+        const std::vector<std::string>& in = documents[at->first];
+        const auto is_unread = [this](const std::string& path) { return files_[path].is_unread; };
+        ASSERT_TRUE(!few || std::any_of(in.begin(), in.end(), is_unread) == (folder.unread.size() == 1)) << folder.path;
+        ++at;
+      }
+      more = page.more;
+      if (more) request.after = page.folders.back().path;
+    }
+    ASSERT_EQ(at, expected.end()) << at->first;
+    for (auto& [folder, in] : documents) {
+      GetRequest get = {"", "", random_() % 2 == 0 ? "" : in.front(), -1, {"KOVAMDPath"}};
+      get.folder = folder;
+      std::vector<std::string> listed;
+      if (!get.after.empty()) listed.push_back(in.front());
+      store_->Get(get, [&](const Json::Value& entry) { listed.push_back(entry["KOVAMDPath"].asString()); });
+      ASSERT_EQ(in, listed);
+    }
   }
 
   /// What searches see, which is what was committed.
@@ -262,6 +305,8 @@ class StoreModel {
     const File file = {Access(), random_() % 2 == 0, random_() % 3 == 0, Content(), int64_t(random_() % 3)};
     document["_KOVAStamp"] = file.Stamp();
     if (file.is_unread) document["_KOVAExtractError"] = "not text";
+    document["_KOVANeedMeta"] = file.is_unread;
+    document["_KOVATextCut"] = true;
     document["KOVAMDIsDir"] = file.is_folder;
     if (!file.access.empty()) document["_KOVAAccess"] = file.access;
     store_->Upsert(path, document);
@@ -373,6 +418,7 @@ TEST(StoreModelTest, AnySequenceOfChangesLeavesTheDocumentsOfTheModel) {
       model.Step();
       ASSERT_NO_FATAL_FAILURE(model.Check()) << "step " << i;
       ASSERT_NO_FATAL_FAILURE(model.CheckUnread()) << "step " << i;
+      ASSERT_NO_FATAL_FAILURE(model.CheckDigests()) << "step " << i;
       if (i % 10 != 0) continue;
       ASSERT_NO_FATAL_FAILURE(model.CheckSearch()) << "step " << i;
       ASSERT_NO_FATAL_FAILURE(model.CheckFolders()) << "step " << i;

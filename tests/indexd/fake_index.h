@@ -16,6 +16,7 @@
 #include "common/error.h"
 #include "common/file_util.h"
 #include "services/fileindexd/share_index.h"
+#include "wire/folder_digest.h"
 
 namespace ferrox::test {
 
@@ -129,6 +130,34 @@ class FakeIndex : public indexd::ShareIndex {
     for (auto at = documents.upper_bound(after.empty() ? folder + "/" : after);
          at != documents.end() && StringStartWith(at->first, folder + "/") && page.size() < limit; ++at) {
       page.push_back(EntryOf(at->first, at->second));
+    }
+    return page;
+  }
+
+  std::vector<indexd::IndexedEntry> ListIn(const std::string& folder, const std::string& after,
+                                           unsigned limit) override {
+    std::vector<indexd::IndexedEntry> page = List(folder, after, ~0U);
+    std::erase_if(page, [&folder](const auto& entry) { return Dirname(entry.path) != folder; });
+    page.resize(std::min<size_t>(page.size(), limit));
+    return page;
+  }
+
+  /// Two folders a page.
+  indexd::FolderPage Folders(const std::string& folder, const std::string& after, uint64_t seed) override {
+    const std::lock_guard lock(mutex);
+    std::map<std::string, wire::FolderDigest> digests;
+    for (const auto& [path, document] : documents) {
+      wire::FolderDigest& digest = digests.try_emplace(Dirname(path) + "/", seed).first->second;
+      unsigned marks = document.with_content ? wire::FolderDigest::kWithContent : wire::FolderDigest::kNone;
+      if (document.access.empty()) marks |= wire::FolderDigest::kNoAccess;
+      digest.Add(Basename(path), document.stamp, marks);
+    }
+    indexd::FolderPage page;
+    for (auto at = digests.lower_bound(folder + "/"); at != digests.end() && !page.more; ++at) {
+      if (!StringStartWith(at->first, folder + "/")) break;
+      if (!after.empty() && at->first <= after + "/") continue;
+      page.folders.push_back({at->first.substr(0, at->first.size() - 1), at->second.Value()});
+      page.more = page.folders.size() == 2;
     }
     return page;
   }

@@ -28,6 +28,7 @@ Json::Value OnPing(CommandCall& /*call*/) {
 }
 
 constexpr Command kOtherCommands[] = {{"access_set", &RunAccessSet, Users::kPrivileged},
+                                      {"folder_digests", &RunFolderDigests, Users::kPrivileged},
                                       {"commit", &OnCommit, Users::kPrivileged},
                                       {"update_term_suggestion", &OnUpdateTermSuggestion, Users::kPrivileged},
                                       {"search", &RunSearch, Users::kEveryone},

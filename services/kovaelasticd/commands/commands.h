@@ -65,6 +65,8 @@ std::span<const Command> IndexCommands();     ///< index_commands.cpp
 std::span<const Command> DocumentCommands();  ///< document_commands.cpp
 /// The command "access_set" (access_command.cpp).
 Json::Value RunAccessSet(CommandCall& call);
+/// The command "folder_digests" (digest_command.cpp).
+Json::Value RunFolderDigests(CommandCall& call);
 /// The command "search" (search_command.cpp).
 Json::Value RunSearch(CommandCall& call);
 /// The command "show" (show_command.cpp).

@@ -14,6 +14,9 @@ namespace {
 /// A longer list of documents is to be asked for in pages.
 constexpr int64_t kListMaxBytes = 128 << 20;
 
+/// What may be deleted by a query.
+constexpr char kByPath[] = R"({"prefix": {"KOVAMDPath": ...}} or {"term": {"KOVAMDPath": ...}})";
+
 constexpr const char* kUpsert = "document_upsert_by_id";
 constexpr const char* kSet = "document_set_by_id";
 constexpr const char* kMoveFolder = "folder_move";
@@ -34,8 +37,13 @@ GetRequest ReadQuery(const Json::Value& query) {
   const Json::Value& term = qsl["term"];
   const bool one = prefix.isNull() != term.isNull() && qsl.size() == 1;
   const Json::Value& condition = prefix.isNull() ? term : prefix;
+  if (one && term.isObject() && term.size() == 1 && term[field::kParent].isString()) {
+    request.folder = CheckedPath(field::kParent, term[field::kParent].asString());
+    if (request.folder != "/") request.folder += '/';
+    return request;
+  }
   if (!one || !condition.isObject() || condition.size() != 1 || !condition[field::kPath].isString()) {
-    RefuseMember("qsl", R"({"prefix": {"KOVAMDPath": ...}} or {"term": {"KOVAMDPath": ...}})");
+    RefuseMember("qsl", kByPath);
   }
   (prefix.isNull() ? request.term : request.prefix) = CheckedPath(field::kPath, condition[field::kPath].asString());
   return request;
@@ -106,6 +114,7 @@ DocumentChange ReadDocumentChange(const std::string& command, const Registry::Op
   if (command == kDeleteQuery) {
     const GetRequest request = ReadQuery(RequiredObject(data, "query"));
     const bool one = !request.term.empty();
+    if (!one && request.prefix.empty()) RefuseMember("qsl", kByPath);
     return {one ? DocumentChange::Type::kDelete : DocumentChange::Type::kDeletePrefix,
             one ? request.term : request.prefix};
   }

@@ -88,8 +88,19 @@ void Catalogue::List(const GetRequest& request, const std::function<void(const S
     for (const int64_t id : listed_.Page(request)) take_if_there(FindDocument(database_, tree_, id));
     return;
   }
+  if (!request.folder.empty()) return ListIn(request, take);
   PathWalk walk(database_, tree_, request.prefix, request.after);
   for (int64_t left = request.limit; left != 0 && walk.Next(); --left) take(walk.Document());
+}
+
+void Catalogue::ListIn(const GetRequest& request, const std::function<void(const StoredDocument&)>& take) {
+  static const std::string from = std::string(kSelectRow) + "WHERE folder = ?1 AND leaf ";
+  const int64_t folder = tree_.Find(request.folder);
+  const bool goes_on = !request.after.empty();
+  if (folder == FolderTree::kNone || (goes_on && FolderTree::FolderOf(request.after) != request.folder)) return;
+  Statement rows = database_.Prepare(from + (goes_on ? ">" : ">=") + " ?2 ORDER BY leaf LIMIT ?3");
+  rows.Bind(1, folder).Bind(2, FolderTree::LeafOf(request.after)).Bind(3, request.limit);
+  while (rows.Step()) take(ReadRow(rows, request.folder));
 }
 
 void Catalogue::CountText(int64_t before, int64_t after) {

@@ -70,6 +70,7 @@ class Catalogue {
   const Totals& Sums() const { return totals_; }
 
  private:
+  void ListIn(const GetRequest& request, const std::function<void(const StoredDocument&)>& take);
   void CountText(int64_t before, int64_t after);
   void CountAccess(const DocRow* before, const DocRow* after);
   void OnRow(RowWatch::Table table, int64_t number, bool is_update);

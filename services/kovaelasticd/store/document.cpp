@@ -161,6 +161,11 @@ DocRow PackDocument(const std::string& path, const Json::Value& document, const 
   return row;
 }
 
+uint32_t DerivedBit(const std::string& name) {
+  const int index = DerivedIndex(name);
+  return index < 0 ? 0 : 1U << index;
+}
+
 std::vector<std::string> NamesNeeded(const Json::Value& document, const FieldNames& names) {
   std::vector<std::string> needed;
   for (auto member = document.begin(); member != document.end(); ++member) {

@@ -67,6 +67,8 @@ std::string RangeWord(const std::string& field_name, int64_t number);
 
 /// The row of a document, without its access record. `names` must know every member (see NamesNeeded).
 DocRow PackDocument(const std::string& path, const Json::Value& document, const FieldNames& names);
+/// The bit of a field in DocRow::derived; 0 for one that never follows from columns.
+uint32_t DerivedBit(const std::string& name);
 /// The members of `document` whose names `names` does not know yet.
 std::vector<std::string> NamesNeeded(const Json::Value& document, const FieldNames& names);
 /// The fields of a stored document, without text content and access record; only those in `wanted` unless that is

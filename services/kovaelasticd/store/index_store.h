@@ -16,8 +16,8 @@
 
 namespace ferrox::engine {
 
-/// Which documents Get lists: the one at `term`, or the suspects, or the unread, or those of `file`, or those whose
-/// path begins with `prefix`, in the order of their paths.
+/// Which documents Get lists: the one at `term`, or the suspects, or the unread, or those of `file`, or those directly
+/// in `folder`, or those whose path begins with `prefix`, in the order of their paths.
 struct GetRequest {
   std::string term;
   std::string prefix;
@@ -26,8 +26,38 @@ struct GetRequest {
   std::vector<std::string> fields;  ///< the fields to load; empty: all
   /// Documents that may be older than their file, since a change was reported under another of its names only.
   bool suspects = false;
-  bool unread = false;  ///< documents with "_KOVAExtractError"
-  uint64_t file = 0;    ///< the number at the end of "_KOVAStamp"; 0: not asked for
+  bool unread = false;      ///< documents with "_KOVAExtractError"
+  uint64_t file = 0;        ///< the number at the end of "_KOVAStamp"; 0: not asked for
+  std::string folder = {};  ///< with "/" at its end
+};
+
+/// Which folders Digests tells of: those at and below `path` that have documents directly in them. The paths of folders
+/// have a "/" at their end.
+struct DigestRequest {
+  std::string path;
+  std::string after;               ///< only folders behind this one; "": from the first
+  uint64_t seed = 0;               ///< of the digests (wire::FolderDigest)
+  int64_t limit = 1000;            ///< at most so many folders
+  int64_t most_in_folder = 50000;  ///< a folder with more documents directly in it has no digest
+  int64_t most_documents = 50000;  ///< no further folder once so many documents were looked at
+};
+
+/// Documents whose content was wanted, and was not read or not all of it.
+struct UnreadContent {
+  std::string type;     ///< "KOVAMDContentType"; "": it has none
+  int64_t version = 0;  ///< "_KOVAExtractVersion"
+};
+
+struct FolderState {
+  std::string path;
+  int64_t documents = 0;                   ///< directly in it
+  std::optional<uint64_t> digest = {};     ///< of these
+  std::vector<UnreadContent> unread = {};  ///< of these, each kind once
+};
+
+struct DigestPage {
+  std::vector<FolderState> folders;
+  bool more = false;  ///< there may be folders behind these
 };
 
 /// What hits are ordered by.
@@ -92,10 +122,10 @@ struct AccessReport {
   std::vector<size_t> missing;    ///< of paths without a document
 };
 
-/// One index: its documents, and what finds them. Changes, Get and Commit are for one thread at a time; Search and Stat
-/// may be called by any number of others meanwhile, never wait for a change, and see what was committed.
-/// Every member throws Error kEngineStorage, with the file and the remedy, when the disk is full or the file is
-/// unusable; after that, call Rollback.
+/// One index: its documents, and what finds them. Changes, Get, Digests and Commit are for one thread at a time; Search
+/// and Stat may be called by any number of others meanwhile, never wait for a change, and see what was committed. Every
+/// member throws Error kEngineStorage, with the file and the remedy, when the disk is full or the file is unusable;
+/// after that, call Rollback.
 class IndexStore {
  public:
   IndexStore() = default;
@@ -127,6 +157,8 @@ class IndexStore {
   virtual void DeletePrefix(const std::string& prefix) = 0;
   /// Lists documents, uncommitted ones too.
   virtual void Get(const GetRequest& request, const std::function<void(Json::Value)>& take) = 0;
+  /// Digests of the documents in folders, in the order in which Get lists what is in these; uncommitted changes count.
+  virtual DigestPage Digests(const DigestRequest& request) = 0;
   /// Makes all changes durable and visible to Search.
   virtual void Commit() = 0;
   /// Forgets the changes since the last commit.

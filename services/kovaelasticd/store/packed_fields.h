@@ -24,6 +24,9 @@ std::optional<std::string_view> TextField(std::string_view packed, int64_t numbe
 /// Goes through packed fields. Bytes that AddField cannot have written end it.
 class PackedFields {
  public:
+  /// The first byte of a packed value. Stored: the numbers never change.
+  enum class Tag : char { kNull, kFalse, kTrue, kInt, kText, kJson };
+
   /// `packed` must outlive this.
   explicit PackedFields(std::string_view packed) : packed_(packed) {}
 
@@ -32,16 +35,15 @@ class PackedFields {
 
   // The field at hand, after a Next that returned true.
   int64_t Number() const { return number_; }
+  Tag Kind() const { return tag_; }
   Json::Value Value() const;
   bool IsText() const { return tag_ == Tag::kText; }
   std::string_view Text() const {
     return text_;
   }                                        ///< of a text, or of the JSON text that an array or object is kept as
+  int64_t Int() const { return int_; }     ///< of a whole number
   size_t Begin() const { return begin_; }  ///< where it stands in `packed`
   size_t End() const { return at_; }
-
-  /// The first byte of a packed value. Stored: the numbers never change.
-  enum class Tag : char { kNull, kFalse, kTrue, kInt, kText, kJson };
 
  private:
   uint64_t ReadNumber();

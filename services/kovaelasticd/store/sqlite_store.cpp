@@ -2,6 +2,7 @@
 
 #include <algorithm>
 
+#include "services/kovaelasticd/store/folder_digests.h"
 #include "services/kovaelasticd/store/store_stat.h"
 
 namespace ferrox::engine {
@@ -46,6 +47,18 @@ Json::Value SqliteStore::LoadEntry(const StoredDocument& stored, const std::vect
 
 void SqliteStore::Get(const GetRequest& request, const std::function<void(Json::Value)>& take) {
   catalogue_.List(request, [&](const StoredDocument& stored) { take(LoadEntry(stored, request.fields)); });
+}
+
+DigestPage SqliteStore::Digests(const DigestRequest& request) {
+  DigestPage page;
+  FolderDigests digests(catalogue_.Connection(), catalogue_.Tree(), catalogue_.Names(), request);
+  while (!page.more) {
+    std::optional<FolderState> folder = digests.Next();
+    if (!folder.has_value()) break;
+    page.folders.push_back(std::move(*folder));
+    page.more = std::ssize(page.folders) >= request.limit || digests.Documents() >= request.most_documents;
+  }
+  return page;
 }
 
 void SqliteStore::ClearSome() {

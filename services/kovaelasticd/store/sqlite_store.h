@@ -34,6 +34,7 @@ class SqliteStore : public IndexStore {
   void Delete(const std::string& path) override;
   void DeletePrefix(const std::string& prefix) override;
   void Get(const GetRequest& request, const std::function<void(Json::Value)>& take) override;
+  DigestPage Digests(const DigestRequest& request) override;
   void Commit() override;
   void Rollback() override;
   int64_t UncommittedBytes() const override { return uncommitted_bytes_; }
