@@ -125,6 +125,7 @@ TEST_F(ContentExtractTest, SpecialAndUnreadableFilesAreNamesWithAReason) {
     EXPECT_EQ("not a regular file", document["_KOVAExtractError"].asString()) << name;
     EXPECT_EQ("txt", document["KOVAMDExtension"].asString());
     EXPECT_TRUE(document["_KOVANeedMeta"].asBool());
+    EXPECT_EQ("0000", document["_KOVAAccess"].asString().substr(document["_KOVAAccess"].asString().rfind(':') + 1));
     const Json::Value by_name = Parse(name, false);
     EXPECT_FALSE(by_name.isMember("_KOVAExtractError") || by_name.isMember("_KOVANeedMeta")) << "no content was wanted";
   }

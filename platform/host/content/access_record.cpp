@@ -79,9 +79,11 @@ std::optional<std::string> ReadAcl(const std::string& path, dev_t device) {
 
 }  // namespace
 
-/// With an ACL that cannot be read, a file counts as one that nobody may read.
+/// What is neither a regular file nor a folder has nothing to read, and with an ACL that cannot be read nothing is
+/// known: both count as what nobody may read.
 std::string AccessRecord(const std::string& path, const Rights& rights) {
-  const std::optional<std::string> acl = ReadAcl(path, rights.device);
+  const bool is_readable = S_ISREG(rights.mode) || S_ISDIR(rights.mode);
+  const std::optional<std::string> acl = is_readable ? ReadAcl(path, rights.device) : std::nullopt;
   char text[48];
   (void)snprintf(text, sizeof(text), "%ju:%ju:%04o", static_cast<uintmax_t>(rights.owner),
                  static_cast<uintmax_t>(rights.group), acl.has_value() ? rights.mode & 07777U : 0);

@@ -10,7 +10,7 @@ namespace kova::content {
 struct Rights {
   uid_t owner = 0;
   gid_t group = 0;
-  mode_t mode = 0;
+  mode_t mode = 0;  ///< with the type
   dev_t device = 0;
 };
 
