@@ -37,6 +37,8 @@ def text(rng, words, length):
 def make_own(share, part, files):
     """The part of the files that the user may read, with times of their own; equal in all instances."""
     rng = random.Random(part)
+    write(f"{share}/{OWN[0]}/known.txt", "known " + " ".join(OWN))
+    os.utime(f"{share}/{OWN[0]}/known.txt", (0, 1_400_000_000))
     for number in range(part, files, 3):
         stem = f"{share}/{OWN[number % 11]}/{OWN[number % 5]}/{OWN[rng.randrange(len(OWN))]}{number}"
         body = text(rng, OWN, rng.choice((0, 8, 8, 40, 400)))

@@ -16,7 +16,7 @@ WORDS = ("{a}", "{a} {b}", "{a} {b} {c}", "\"{a} {b}\"", "{a}*", "{p}*", "\"{a} 
 REFUSED = ("(", "\"{a}", "a*", "OR", "size:many", "date:2018-13", "name:", "{a} OR", "((((((((((((((((({a})", "kind:",
            "x" * 5000, " ".join(["{a}"] * 80))
 PATHS = ("{share}/secret0/0", "{share}/dark", "{share}/secret1", "{share}/nothing", "{share}", "{share}/..", "/etc/passwd",
-         "{share}/{x}", "{share}/{x}/once.txt", "/docs/secret0", "/docs/{x}", "/hidden", "/hidden/{x}.txt", "/none/{x}.txt",
+         "{share}/{x}", "{share}/{x}/once.txt", "{share}/{x}/known.txt", "/docs/{x}/known.txt", "/docs/secret0", "/docs/{x}", "/hidden", "/hidden/{x}.txt", "/none/{x}.txt",
          "relative", "")
 COMMANDS = ("index_list", "index_stat", "index_delete", "index_share", "document_get_by_query", "document_del_by_id", "commit",
             "access_set", "update_term_suggestion", "shares", "fresh", "status", "no_such_command")
