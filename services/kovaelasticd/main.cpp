@@ -40,7 +40,7 @@ void Serve() {
   engine::Engine engine(state_folder);
   services::FrameServerOptions options;
   options.socket_path = InstancePath(kElasticdSocket);
-  options.socket_mode = 0660;
+  options.socket_mode = engine.InstanceOwner() == 0 ? 0666 : 0660;  // else nobody but its owner is answered
   options.request_limit_bytes = kRequestMaxBytes;
   options.requests_limit_bytes = 2ULL * kRequestMaxBytes;
   options.workers = kWorkers;
