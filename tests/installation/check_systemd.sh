@@ -4,6 +4,7 @@
 set -euo pipefail
 build=$1
 system=$(mktemp -d)
+chmod 755 "$system"  # its "/", which all users enter
 trap 'rm -rf "$system"' EXIT
 
 libraries=libjsoncpp25,libsqlite3-0,libzstd1,libuchardet0,libseccomp2,libmagic1,libzip4,libarchive13,libtag1v5-vanilla
@@ -19,6 +20,8 @@ trap 'systemctl poweroff --no-block' EXIT
 set -eux
 expect() { [[ "$(systemctl is-active kovaelasticd.service kova-access.service kovanotifyd.service fileindexd.service | tr '\n' ' ')" == "$* " ]]; }
 finds() { for _ in {1..50}; do fileindexctl search "$1" && return; sleep 0.1; done; false; }
+as() { setpriv --reuid "$1" --regid "$1" --clear-groups "${@:2}"; }
+finds_own() { for _ in {1..50}; do [[ "$(as "$1" fileindexctl search harbour | grep /own.txt)" == "/srv/docs/$1/own.txt" ]] && return; sleep 0.1; done; false; }
 if [[ ! -e /srv/docs ]]; then
   mkdir -p /srv/docs
   echo lantern >/srv/docs/a.txt
@@ -32,6 +35,15 @@ if [[ ! -e /srv/docs ]]; then
   fileindexctl search --as 50001:50001 lantern
   echo lighthouse >/srv/docs/b.txt
   finds lighthouse
+  for user in 5001 5002; do
+    mkdir -m 700 "/srv/docs/$user"
+    echo harbour >"/srv/docs/$user/own.txt"
+    chown -R "$user:$user" "/srv/docs/$user"
+  done
+  finds_own 5001
+  finds_own 5002
+  ! as 5001 fileindexctl search --share etc harbour
+  ! as 5001 ls /etc/kova
   fileindexctl status
   fileindexctl status | tee /dev/stderr | grep "content extraction: runs"
   ! fileindexctl status | grep "lack a protection"
