@@ -8,9 +8,9 @@
 #include <json/value.h>
 
 #include "base/unique_fd.h"
-#include "services/support/open_limit.h"
 #include "services/kovacontentextractd/worker_pool.h"
 #include "services/support/frame_server.h"
+#include "services/support/open_limit.h"
 
 namespace ferrox::extract {
 

@@ -22,10 +22,10 @@
 
 #include <json/writer.h>
 
+#include "base/descriptor_passing.h"
 #include "base/files.h"
 #include "services/kovacontentextractd/sandbox.h"
 #include "services/kovacontentextractd/worker_protocol.h"
-#include "base/descriptor_passing.h"
 
 namespace ferrox::extract {
 
@@ -102,8 +102,7 @@ bool TakeText(std::string_view& come, size_t size, std::string& text) {
 bool ReceiveRequest(Request& request) {
   std::array<char, 1024> buffer;
   RequestHeader header;
-  const ssize_t got =
-      base::ReceiveWithDescriptors(kWorkerSocket, buffer.data(), buffer.size(), &request.source.fd, 1);
+  const ssize_t got = base::ReceiveWithDescriptors(kWorkerSocket, buffer.data(), buffer.size(), &request.source.fd, 1);
   if (got < static_cast<ssize_t>(sizeof(header)) || request.source.fd < 0) return false;
   memcpy(&header, buffer.data(), sizeof(header));
   request.number = header.number;

@@ -11,13 +11,13 @@
 #include <cstring>
 #include <optional>
 
+#include "base/descriptor_passing.h"
 #include "common/error.h"
 #include "common/json_util.h"
 #include "common/log.h"
 #include "services/kovacontentextractd/region.h"
 #include "services/kovacontentextractd/worker_protocol.h"
 #include "services/kovacontentextractd/worker_template.h"
-#include "base/descriptor_passing.h"
 
 namespace ferrox::extract {
 

@@ -11,11 +11,11 @@
 #include <cstring>
 #include <string_view>
 
+#include "base/descriptor_passing.h"
 #include "base/scope_exit.h"
 #include "common/error.h"
 #include "common/log.h"
 #include "services/kovacontentextractd/worker_protocol.h"
-#include "base/descriptor_passing.h"
 
 namespace ferrox::extract {
 

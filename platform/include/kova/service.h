@@ -10,11 +10,11 @@ enum { KLIB_SERVICECTL_UPSTART = 1 };
 
 /// Start or stop the named service and wait until it has. 0, also when it was so already; below 0 on failure.
 /// An instance knows the services "kovaelasticd", "kova-access", "kovacontentextractd", "kovanotifyd" and
-/// "pkg-Ferrox-fileindexd" and runs them as child processes of its own, each with a pid file; blocks for at most 10 s to start, 20 s to stop.
-/// On a host that systemd runs, outside of instances, they are its units, and "samba" is a service as well; a call then
-/// blocks for as long as systemctl does. An unknown name, or one that is not installed, is KOVA_ERR_NOT_SUPPORTED. A
-/// restart of a child process is a stop and a start; nothing is started when the stop fails. `now` and `kind` are
-/// passed over.
+/// "pkg-Ferrox-fileindexd" and runs them as child processes of its own, each with a pid file; blocks for at most 10 s
+/// to start, 20 s to stop. On a host that systemd runs, outside of instances, they are its units, and "samba" is a
+/// service as well; a call then blocks for as long as systemctl does. An unknown name, or one that is not installed, is
+/// KOVA_ERR_NOT_SUPPORTED. A restart of a child process is a stop and a start; nothing is started when the stop fails.
+/// `now` and `kind` are passed over.
 int KLIBServiceStart(const char* name, int now);
 int KLIBServiceStop(const char* name, int now);
 int KLIBServiceRestart(const char* name);
