@@ -72,29 +72,6 @@ bool Answers(const ServiceRow& service) {
   return connection.Valid();
 }
 
-/// Where a service's program is installed, "" when nowhere: the folders of child_service.h, in that order.
-/// FERROX_LIBEXEC does not count in a process with raised privileges.
-std::string FindProgram(const std::string& program) {
-  std::string folders[4];
-  const char* given = secure_getenv("FERROX_LIBEXEC");
-  if (given != nullptr) folders[0] = given;
-  char self[4096];
-  const ssize_t length = readlink("/proc/self/exe", self, sizeof(self));
-  if (length > 0 && static_cast<size_t>(length) < sizeof(self)) {
-    folders[1] = base::FolderOf(std::string(self, static_cast<size_t>(length)));
-    folders[2] = base::FolderOf(folders[1]) + "/sbin";
-    folders[3] = base::FolderOf(folders[1]) + "/libexec";
-  }
-  for (const std::string& folder : folders) {
-    const std::string path = folder + "/" + program;
-    struct stat info = {};
-    if (!folder.empty() && stat(path.c_str(), &info) == 0 && S_ISREG(info.st_mode) && access(path.c_str(), X_OK) == 0) {
-      return path;
-    }
-  }
-  return {};
-}
-
 /// The last line that is not empty of what a text file holds from byte `from` on.
 std::string LastLine(const std::string& path, std::streamoff from) {
   constexpr std::streamoff kTailBytes = 4096;
@@ -217,6 +194,28 @@ int Prepare(const ServiceRow& service, SwitchLock& lock) {
 }
 
 }  // namespace
+
+/// FERROX_LIBEXEC does not count in a process with raised privileges.
+std::string FindProgram(const std::string& program) {
+  std::string folders[4];
+  const char* given = secure_getenv("FERROX_LIBEXEC");
+  if (given != nullptr) folders[0] = given;
+  char self[4096];
+  const ssize_t length = readlink("/proc/self/exe", self, sizeof(self));
+  if (length > 0 && static_cast<size_t>(length) < sizeof(self)) {
+    folders[1] = base::FolderOf(std::string(self, static_cast<size_t>(length)));
+    folders[2] = base::FolderOf(folders[1]) + "/sbin";
+    folders[3] = base::FolderOf(folders[1]) + "/libexec";
+  }
+  for (const std::string& folder : folders) {
+    const std::string path = folder + "/" + program;
+    struct stat info = {};
+    if (!folder.empty() && stat(path.c_str(), &info) == 0 && S_ISREG(info.st_mode) && access(path.c_str(), X_OK) == 0) {
+      return path;
+    }
+  }
+  return {};
+}
 
 std::string LastServiceProblem() { return t_problem; }
 

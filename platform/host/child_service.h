@@ -23,6 +23,8 @@ inline constexpr ServiceRow kSupervisor = {"fileindex-supervisor", "fileindex-su
 
 /// The services of an instance.
 std::span<const ServiceRow> ChildServices();
+/// Where a program is installed, "" when nowhere.
+std::string FindProgram(const std::string& program);
 /// Whether systemd runs them instead.
 bool HasServiceManager();
 

@@ -40,6 +40,8 @@ Configuration Load(const std::string& path) {
   configuration.problem = ReadJsonFile(path, value);
   if (!configuration.problem.empty() || value.isNull()) return configuration;
   const bool read = value.isObject() && ReadMember(value, "admin_group", configuration.admin_group) &&
+                    ReadMember(value, "trusted_clients", configuration.trusted_clients) &&
+                    ReadMember(value, "least_user", configuration.least_user) &&
                     (!value.isMember("samba") || ReadSamba(value["samba"], configuration.samba)) &&
                     (!value.isMember("notifyd") || ReadNotifyd(value["notifyd"], configuration.notifyd));
   if (!read) configuration.problem = "is not an object of settings, or one has the wrong type";

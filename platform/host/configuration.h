@@ -23,6 +23,9 @@ struct Configuration {
     std::vector<std::string> watch = {"fanotify", "fanotify inode marks", "inotify", "periodic scan"};
     uint32_t scan_interval_sec = 600;  ///< between the scans of what it cannot watch
   } notifyd = {};
+  /// Users whose programs may search for others, and the least uid that they may search for.
+  std::vector<std::string> trusted_clients = {};
+  uint32_t least_user = 1000;
   std::string problem = {};  ///< why the file cannot be used, for people; empty when it can
 };
 

@@ -22,8 +22,6 @@ namespace kova::host {
 
 namespace {
 
-constexpr std::chrono::seconds kOutputMax{10};
-
 /// A program starts as from a shell: daemons block signals and ignore SIGPIPE, what they run must not.
 class PlainSignals {
  public:
@@ -89,8 +87,8 @@ int WaitFor(pid_t pid) {
 }
 
 /// Reads until the other end is closed; false when that takes too long or too much.
-bool ReadToEnd(int fd, std::string& output) {
-  const auto deadline = std::chrono::steady_clock::now() + kOutputMax;
+bool ReadToEnd(int fd, std::string& output, std::chrono::seconds longest) {
+  const auto deadline = std::chrono::steady_clock::now() + longest;
   for (;;) {
     const auto left =
         std::chrono::duration_cast<std::chrono::milliseconds>(deadline - std::chrono::steady_clock::now());
@@ -121,7 +119,8 @@ int RunProgram(const std::string& path, const std::vector<std::string>& argument
   return pid < 0 ? -1 : WaitFor(pid);
 }
 
-int RunForOutput(const std::string& path, const std::vector<std::string>& arguments, std::string& output) {
+int RunForOutput(const std::string& path, const std::vector<std::string>& arguments, std::string& output,
+                 std::chrono::seconds longest) {
   output.clear();
   int ends[2] = {-1, -1};
   if (pipe2(ends, O_CLOEXEC) != 0) return KOVA_FAIL_ERRNO();
@@ -133,7 +132,7 @@ int RunForOutput(const std::string& path, const std::vector<std::string>& argume
     pid = Spawn(path, arguments, actions.Get());
   }
   if (pid < 0) return -1;
-  const bool whole = ReadToEnd(read_end.Get(), output);
+  const bool whole = ReadToEnd(read_end.Get(), output, longest);
   if (!whole) (void)kill(pid, SIGKILL);
   const int status = WaitFor(pid);
   return whole ? status : KOVA_FAIL(KOVA_ERR_SYSTEM);

@@ -1,5 +1,6 @@
 #pragma once
 
+#include <chrono>
 #include <string>
 #include <vector>
 
@@ -10,8 +11,10 @@ namespace kova::host {
 int RunProgram(const std::string& path, const std::vector<std::string>& arguments);
 
 /// The same, with what the program writes to its standard output; nothing is read from standard input, and standard
-/// error is dropped. Below 0 as well when it writes more than 16 MiB or does not end within 10 s; it is killed then.
-int RunForOutput(const std::string& path, const std::vector<std::string>& arguments, std::string& output);
+/// error is dropped. Below 0 as well when it writes more than 16 MiB or does not end within `longest`; it is
+/// killed then.
+int RunForOutput(const std::string& path, const std::vector<std::string>& arguments, std::string& output,
+                 std::chrono::seconds longest = std::chrono::seconds(10));
 
 /// The arguments as the system takes them: pointers into `texts`, which must outlive them, and a null at the end.
 std::vector<char*> ArgumentVector(const std::vector<std::string>& texts);

@@ -2,14 +2,19 @@
 
 #include <cstdio>
 #include <cstring>
+#include <utility>
 
 #include <kova/log.h>
 
 #include "base/files.h"
 #include "common/error.h"
 #include "common/paths.h"
+#include "platform/host/account_lookup.h"
+#include "platform/host/trusted_clients.h"
 #include "services/kovaelasticd/commands/caller.h"
 #include "services/kovaelasticd/commands/engine.h"
+#include "services/kovaelasticd/commands/live_look.h"
+#include "services/kovaelasticd/commands/named_users.h"
 #include "services/kovaelasticd/commands/user_limits.h"
 #include "services/support/daemon.h"
 #include "services/support/frame_server.h"
@@ -28,6 +33,11 @@ void KeepMemoryForSearches() {
   (void)mallopt(M_TRIM_THRESHOLD, 16 << 20);
 }
 
+ferrox::engine::Trust ReadTrust() {
+  kova::host::TrustedClients clients = kova::host::GetTrustedClients();
+  return {std::move(clients.uids), clients.least_user};
+}
+
 void Serve() {
   using namespace ferrox;
   constexpr uint32_t kRequestMaxBytes = 256U << 20;
@@ -37,14 +47,15 @@ void Serve() {
   if (!base::MakeFolders(state_folder, 0700)) {
     throw Error(Error::kInternal, "cannot make the folder " + state_folder);
   }
-  engine::Engine engine(state_folder);
+  engine::Engine engine(state_folder, &engine::LookOnDisk, {&ReadTrust, &kova::host::LookUpAccount});
   services::FrameServerOptions options;
   options.socket_path = InstancePath(kElasticdSocket);
   options.socket_mode = engine.InstanceOwner() == 0 ? 0666 : 0660;  // else nobody but its owner is answered
   options.request_limit_bytes = kRequestMaxBytes;
   options.requests_limit_bytes = 2ULL * kRequestMaxBytes;
   options.workers = kWorkers;
-  options.users = engine::LimitsOfUsers(engine.InstanceOwner());
+  options.users =
+      engine::LimitsOfUsers(engine.InstanceOwner(), [&engine](uint32_t uid) { return engine.IsTrusted(uid); });
   options.on_stop = [&engine] { engine.EndWaits(); };
   services::FrameServer server(options, [&engine](const std::string& request, const services::Peer& peer) {
     return engine.Handle(request, peer);

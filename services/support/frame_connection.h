@@ -39,6 +39,7 @@ struct FrameConnection {
   base::UniqueFd descriptor;  ///< peer.descriptor
   bool busy = false;          ///< a thread is at work on it
   bool is_bound = false;      ///< by UserLimits
+  bool is_for_many = false;   ///< bound, but not as one user
   State state = State::kReceiving;
   std::string body;  ///< of the request as far as it has come, or of the reply
   SteadyClock::time_point last_progress = SteadyClock::now();

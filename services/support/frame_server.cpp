@@ -126,6 +126,8 @@ class FrameServer::Impl {
     auto connection = std::make_unique<FrameConnection>();
     connection->peer = PeerOf(fd.Get());
     connection->is_bound = options_.users.is_bound != nullptr && options_.users.is_bound(connection->peer);
+    connection->is_for_many =
+        connection->is_bound && options_.users.is_for_many != nullptr && options_.users.is_for_many(connection->peer);
     connection->fd = std::move(fd);
     return connection;
   }
@@ -135,7 +137,8 @@ class FrameServer::Impl {
     const auto is_own = [&newcomer](const FrameConnection& one) {
       return one.is_bound && one.peer.uid == newcomer.peer.uid;
     };
-    if (newcomer.is_bound && Count(is_own) >= options_.users.connections) return EndLongestIdle(is_own);
+    const bool is_one_user = newcomer.is_bound && !newcomer.is_for_many;
+    if (is_one_user && Count(is_own) >= options_.users.connections) return EndLongestIdle(is_own);
     if (newcomer.is_bound && Count(&IsBound) >= options_.connections_max / 2) return EndLongestIdle(&IsBound);
     if (connections_.size() < options_.connections_max) return true;
     return EndLongestIdle(newcomer.is_bound ? &IsBound : &IsAny);
@@ -183,7 +186,7 @@ class FrameServer::Impl {
   RequestGate::Admission Enter(FrameConnection& connection) {
     if (!connection.is_bound) return RequestGate::Admission::kRun;
     const base::MutexLock lock(mutex_);
-    const RequestGate::Admission admission = gate_.Enter(connection.peer.uid, connection.id);
+    const RequestGate::Admission admission = gate_.Enter(connection.peer.uid, connection.id, connection.is_for_many);
     if (admission == RequestGate::Admission::kWait) {
       connection.state = FrameConnection::State::kWaiting;
       connection.busy = false;

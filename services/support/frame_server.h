@@ -37,6 +37,9 @@ struct FrameReply {
 struct UserLimits {
   /// Whether a peer is bound; null: nobody is.
   std::function<bool(const Peer& peer)> is_bound = nullptr;
+  /// Of a bound peer, whether it asks for many users: of the following, only the size of requests binds it, beside what
+  /// all bound users have together. Null: none does.
+  std::function<bool(const Peer& peer)> is_for_many = nullptr;
   uint32_t request_limit_bytes = 64U << 10;
   /// Beyond these a new connection takes the place of the user's own that was idle for the longest time, or is closed.
   unsigned connections = 16;

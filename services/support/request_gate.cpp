@@ -4,14 +4,15 @@
 
 namespace ferrox::services {
 
-RequestGate::Admission RequestGate::Enter(uid_t uid, uint64_t id) {
+RequestGate::Admission RequestGate::Enter(uid_t uid, uint64_t id, bool for_many) {
   Count& count = counts_[uid];
+  count.for_many = for_many;
   if (count.waiting == 0 && MayRun(count)) {
     ++at_work_;
     ++count.at_work;
     return Admission::kRun;
   }
-  if (count.waiting >= limits_.waiting_each) {
+  if (!for_many && count.waiting >= limits_.waiting_each) {
     DropIfUnused(uid);
     return Admission::kRefused;
   }

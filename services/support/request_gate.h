@@ -21,8 +21,9 @@ class RequestGate {
 
   explicit RequestGate(const Limits& limits) : limits_(limits) {}
 
-  /// `id` is that of the request's connection. What may run is at work until Leave.
-  Admission Enter(uid_t uid, uint64_t id);
+  /// `id` is that of the request's connection. What may run is at work until Leave. One who asks for many users is
+  /// bound by what all may have alone.
+  Admission Enter(uid_t uid, uint64_t id, bool for_many = false);
   void Leave(uid_t uid);
   /// A request that has waited and may run now; it is at work from then on. To be asked for after each Leave.
   std::optional<uint64_t> Next();
@@ -32,6 +33,7 @@ class RequestGate {
  private:
   struct Count {
     unsigned at_work = 0, waiting = 0;
+    bool for_many = false;  ///< by the last request
   };
   struct Waiting {
     uid_t uid;
@@ -39,7 +41,7 @@ class RequestGate {
   };
 
   bool MayRun(const Count& count) const {
-    return at_work_ < limits_.at_work_all && count.at_work < limits_.at_work_each;
+    return at_work_ < limits_.at_work_all && (count.for_many || count.at_work < limits_.at_work_each);
   }
   void DropIfUnused(uid_t uid);
 

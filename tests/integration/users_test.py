@@ -11,7 +11,7 @@ from instance import BIN, InstanceTestCase, wait_for, write
 
 sys.path.insert(0, os.path.join(os.path.dirname(os.path.abspath(__file__)), "..", "rights"))
 
-from asking import ACCESS, Child, User, acl_bytes, opens  # noqa: E402
+from asking import ACCESS, Child, Engine, User, acl_bytes, opens  # noqa: E402
 from rights_world import USERS, World  # noqa: E402
 
 TEAM = 50010
@@ -140,6 +140,58 @@ class UsersTest(InstanceTestCase):
         os.chmod(f"{plans}/bob", 0o755)
         os.chmod(f"{plans}/bob/b.txt", 0o644)
         wait_for(lambda: b"b.txt" in self.by_root(ANN, "search", "lantern").stdout, "a file that everybody may read now")
+
+    def test_a_trusted_client_asks_for_users(self):
+        self.make_shares()
+        root, client = self.instance.root, User(1, [1])  # "daemon"
+        # Accounts that no host has: one whom the name service knows, and one for whom it has no answer.
+        write(f"{root}/bin/kova-accounts", f"""#!/bin/sh
+case $2 in
+  ann) shift 2; echo '{{"uid":{ANN.uid},"gids":[{ANN.uid},{TEAM}],"may_log_in":true,"rules":['$(for rule; do printf '%s"no"' "$comma"; comma=,; done)']}}';;
+  hangs) exec sleep 60;;
+  *) exec {BIN}/kova-accounts "$@";;
+esac
+""")
+        os.chmod(f"{root}/bin/kova-accounts", 0o755)
+        self.ctl("down")
+        self.instance.env["FERROX_LIBEXEC"] = f"{root}/bin"
+        self.ctl("up")
+
+        def ask(name, command="search", user=client):
+            data = {"as": {"user": name}, "query": "lantern ext:txt", "path": f"{root}/vol/plans/bob/b.txt"}
+            engine = f"{root}/var/run/kovaelasticd.sock"
+            return json.loads(Child(user, lambda: Engine(engine).ask(command, data)).result())
+
+        def found(name):
+            reply = ask(name)
+            return sorted(os.path.basename(hit["doc_id"]) for hit in reply.get("data", {}).get("hits", [])) or reply["error"]["code"]
+
+        self.assertEqual(1406, found("ann"))
+        write(f"{root}/etc/kova/kova.json", '{"trusted_clients": ["daemon"], "least_user": 1}')
+        wait_for(lambda: found("ann") == ["a.txt", "all.txt", "c.txt"], "the settings")
+        self.assertEqual(1405, ask("ann", "show")["error"]["code"])
+        self.assertEqual([1406] * 2, [ask("ann", "fresh")["error"]["code"], ask("ann", user=BOB)["error"]["code"]])
+        for name in ("root", 0, "nobody", 65534, "no-such-user"):
+            self.assertEqual({"code": 1406, "msg": f'"{name}" may not search by way of another program'}, ask(name)["error"])
+        self.assertEqual(1414, found("hangs"))
+        self.assertEqual(["a.txt", "all.txt", "c.txt"], found("ann"))
+        # The share's rules, and settings that cannot be read.
+        table = f"{root}/etc/kova/shares.json"
+        with open(table, encoding="utf-8") as file:
+            shares = json.load(file)
+        next(share for share in shares if share["name"] == "plans")["valid_users"] = ["bob"]
+        write(table, json.dumps(shares))
+        wait_for(lambda: ask("ann", "shares").get("data") == [], "the rules")
+        write(f"{root}/etc/kova/kova.json", '{"trusted_clients": ["daemon"], "least_user": "1"}')
+        wait_for(lambda: ask("ann").get("error", {}).get("code") == 1406, "the settings")
+
+    def test_the_name_service_is_asked(self):
+        told = subprocess.run([f"{BIN}/kova-accounts", "uid", "0", "root", "ROOT", "nobody", "+root", "@no-such-group", "+daemon"],
+                              capture_output=True, check=True).stdout
+        told = json.loads(told)
+        self.assertEqual((0, True, ["yes", "unknown", "no", "yes", "unknown", "no"]),
+                         (told["uid"], told["may_log_in"], told["rules"]))
+        self.assertIn(0, told["gids"])
 
     def test_root_is_told_what_stops_a_user(self):
         plans, vault = self.make_shares()

@@ -27,7 +27,7 @@ MAY = {
     "services/support": LIBRARY,
     "cli": LIBRARY + ["services/support"],
 }
-DAEMONS = ("fileindexd", "kova-access", "kovacontentextractd", "kovaelasticd", "kovanotifyd", "supervisor")
+DAEMONS = ("fileindexd", "kova-access", "kova-accounts", "kovacontentextractd", "kovaelasticd", "kovanotifyd", "supervisor")
 MAY |= {f"services/{name}": LIBRARY + ["services/support"] for name in DAEMONS}
 # The engine's rooms, each of which may include those before it.
 ENGINE = [f"services/kovaelasticd/{name}" for name in ("text", "query", "store", "search", "indices", "commands")]
@@ -47,6 +47,7 @@ EXCEPTIONS = {
     # The daemons' main functions know the host that they run on: its table of shares, its registry, its services.
     "services/fileindexd/main.cpp": ["platform/host/samba_shares.h", "platform/host/share_search.h",
                                      "platform/host/mounts.h"],
+    "services/kovaelasticd/main.cpp": ["platform/host/trusted_clients.h", "platform/host/account_lookup.h"],
     "services/kovanotifyd/main.cpp": ["platform/host/configuration.h", "platform/host/notify_registry.h"],
     "services/supervisor/main.cpp": ["platform/host/service_log.h", "platform/host/child_service.h"],
 }

@@ -213,6 +213,9 @@ TEST(RequestGateTest, AmongUsersTheOneWithTheFewestAtWorkComesNext) {
   gate.Forget(1, 12);
   EXPECT_EQ(std::optional<uint64_t>(13), gate.Next());
   EXPECT_EQ(std::nullopt, gate.Next());
+  RequestGate many({2, 1, 1});
+  for (const uint64_t id : {40, 41}) EXPECT_EQ(Admission::kRun, many.Enter(4, id, true));
+  for (const uint64_t id : {42, 43}) EXPECT_EQ(Admission::kWait, many.Enter(4, id, true));
 }
 
 TEST_F(FrameServerTest, ReplacesADeadProcessesSocketButNotALiveOnes) {

@@ -35,7 +35,8 @@ Caller CallerOf(const services::Peer& peer, uint32_t instance_owner) {
   return caller;
 }
 
-std::optional<Asker> AskerOf(const Caller& caller, const Json::Value& data) {
+std::optional<Asker> AskerOf(const Caller& caller, const Json::Value& data, const NamedUserPtr& named) {
+  if (named != nullptr) return Asker{named->uid, named->groups, ""};
   const Json::Value& as = data["as"];
   if (as.isNull()) return caller.privileged ? std::nullopt : std::optional(Asker{caller.uid, caller.groups, ""});
   if (!caller.privileged) throw UserError(Error::kEngineNotPermitted, "only root may ask as another user");

@@ -6,6 +6,7 @@
 
 #include <json/value.h>
 
+#include "services/kovaelasticd/commands/named_users.h"
 #include "services/kovaelasticd/store/asker.h"
 #include "services/support/frame_server.h"
 
@@ -20,9 +21,10 @@ struct Caller {
 
 Caller CallerOf(const services::Peer& peer, uint32_t instance_owner);
 
-/// For whom an answer is, without a share yet: for the caller; or, when a privileged one asks "as" somebody else, for
-/// that user, who is {"uid", "groups"}. Nothing when whoever gets the answer may see everything.
-/// @throws Error kEngineNotPermitted for "as" of an ordinary user; kEngineBadRequest.
-std::optional<Asker> AskerOf(const Caller& caller, const Json::Value& data);
+/// For whom an answer is, without a share yet: for `named` where that is not null; for the caller; or, when a
+/// privileged one asks "as" somebody else, for that user, who is {"uid", "groups"}. Nothing when whoever gets the
+/// answer may see everything.
+/// @throws Error kEngineNotPermitted for another "as" of an ordinary user; kEngineBadRequest.
+std::optional<Asker> AskerOf(const Caller& caller, const Json::Value& data, const NamedUserPtr& named);
 
 }  // namespace ferrox::engine

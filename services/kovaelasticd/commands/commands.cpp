@@ -31,10 +31,10 @@ constexpr Command kOtherCommands[] = {{"access_set", &RunAccessSet, Users::kPriv
                                       {"folder_digests", &RunFolderDigests, Users::kPrivileged},
                                       {"commit", &OnCommit, Users::kPrivileged},
                                       {"update_term_suggestion", &OnUpdateTermSuggestion, Users::kPrivileged},
-                                      {"search", &RunSearch, Users::kEveryone},
-                                      {"show", &RunShow, Users::kEveryone},
+                                      {"search", &RunSearch, Users::kEveryoneAndFor},
+                                      {"show", &RunShow, Users::kEveryoneAndFor},
                                       {"fresh", &RunFresh, Users::kEveryone},
-                                      {"shares", &RunShares, Users::kEveryone},
+                                      {"shares", &RunShares, Users::kEveryoneAndFor},
                                       {"ping", &OnPing, Users::kEveryone}};
 
 }  // namespace

@@ -8,6 +8,7 @@
 #include "services/kovaelasticd/commands/caller.h"
 #include "services/kovaelasticd/commands/daemon_relay.h"
 #include "services/kovaelasticd/commands/live_look.h"
+#include "services/kovaelasticd/commands/named_users.h"
 #include "services/kovaelasticd/indices/registry.h"
 
 namespace ferrox::engine {
@@ -22,15 +23,17 @@ struct CommandCall {
   const Caller& caller;
   const LookFunction& look;
   DaemonRelay& relay;
-  Json::Value& data;  ///< the request's "data", an object; the command may move values out of it
+  Json::Value& data;             ///< the request's "data", an object; the command may move values out of it
+  NamedUserPtr named = nullptr;  ///< for whom "as" asks by name
 };
 
 /// What a command does; returns the reply's "data", null for none. Everything is checked before anything is changed.
 /// @throws Error with the reply's code and sentence.
 using CommandFunction = Json::Value (*)(CommandCall& call);
 
-/// Who may use a command. One for everyone answers ordinary users with what they may know: see AskerOf.
-enum class Users { kPrivileged, kEveryone };
+/// Who may use a command. One for everyone answers ordinary users with what they may know: see AskerOf. One of
+/// kEveryoneAndFor trusted clients may use for a user whom they name, too.
+enum class Users { kPrivileged, kEveryone, kEveryoneAndFor };
 
 struct Command {
   const char* name;

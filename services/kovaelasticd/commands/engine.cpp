@@ -8,6 +8,7 @@
 #include "common/json_util.h"
 #include "common/log.h"
 #include "services/kovaelasticd/commands/members.h"
+#include "services/kovaelasticd/commands/share_rules.h"
 #include "services/kovaelasticd/commands/user_error.h"
 #include "services/kovaelasticd/commands/user_limits.h"
 #include "services/kovaelasticd/store/work_limit.h"
@@ -116,8 +117,11 @@ Json::Value SuccessReply(Json::Value data) {
   return reply;
 }
 
-Engine::Engine(const std::string& state_folder, LookFunction look)
-    : registry_(state_folder), instance_owner_(OwnerOfInstance()), look_(std::move(look)) {}
+Engine::Engine(const std::string& state_folder, LookFunction look, UserSources users)
+    : registry_(state_folder),
+      instance_owner_(OwnerOfInstance()),
+      look_(std::move(look)),
+      users_(std::move(users), instance_owner_) {}
 
 std::string Engine::Handle(const std::string& request, const services::Peer& peer) {
   const auto began = std::chrono::steady_clock::now();
@@ -141,7 +145,7 @@ void Engine::RequireRights(const Command& command, const Caller& caller) const {
     throw UserError(Error::kEngineNotPermitted, "this is an instance of user " + std::to_string(instance_owner_) +
                                                     " alone, and answers nobody else but root");
   }
-  if (command.users == Users::kEveryone) return;
+  if (command.users != Users::kPrivileged) return;
   throw UserError(Error::kEngineNotPermitted, "user " + std::to_string(caller.uid) + " may not use \"" + command.name +
                                                   "\"; only root and the owner of the instance may");
 }
@@ -161,11 +165,25 @@ std::string Engine::Answer(const std::string& request, const Caller& caller) {
   return toString(Run(command, caller, parsed));
 }
 
+/// The user whom "as" names; null where it names none, or the caller may not name one, which AskerOf refuses.
+NamedUserPtr Engine::NamedBy(const Command& command, const Caller& caller, const Json::Value& data) {
+  const Json::Value& as = data["as"];
+  if (!as.isObject() || !as.isMember("user")) return nullptr;
+  const bool may = caller.privileged ? command.users != Users::kPrivileged
+                                     : command.users == Users::kEveryoneAndFor && IsTrusted(caller.uid);
+  if (!may) return nullptr;
+  if (as.size() != 1) RefuseMember("as", "an object with \"user\" alone, or with \"uid\" and \"groups\"");
+  return users_.Find(as["user"], NamesInRules(registry_.List()));
+}
+
 /// Who asks as an ordinary user is told of failures what that user is.
 Json::Value Engine::Run(const Command& command, const Caller& caller, Json::Value& part) {
   CommandCall call{registry_, caller, look_, relay_, DataOf(part)};
-  const bool as_user = command.users == Users::kEveryone && !call.data["as"].isNull();
+  const bool as_user = command.users != Users::kPrivileged && !call.data["as"].isNull();
   try {
+    call.named = NamedBy(command, caller, call.data);
+    std::optional<NamedUsers::Turn> turn;
+    if (call.named != nullptr && !caller.privileged) turn.emplace(users_, call.named->uid);
     return SuccessReply(command.run(call));
   } catch (const Error& error) {
     if (!as_user) throw;

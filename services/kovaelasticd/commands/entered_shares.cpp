@@ -3,6 +3,7 @@
 #include <algorithm>
 
 #include "services/kovaelasticd/commands/members.h"
+#include "services/kovaelasticd/commands/share_rules.h"
 #include "services/kovaelasticd/commands/user_error.h"
 
 namespace ferrox::engine {
@@ -13,9 +14,9 @@ namespace {
 constexpr unsigned kSharesMax = 10000;
 
 /// Looks at the share's folder as the asker, who is given its root. Of a folder that is not there, none is entered.
-bool CanEnter(const CommandCall& call, const Asker& asker) {
+bool CanEnter(const CommandCall& call, const Asker& asker, const ShareNote* note) {
   const std::vector<wire::LiveFile> found = call.look(asker, {asker.share_root});
-  return found.size() == 1 && found.front().entered;
+  return found.size() == 1 && IsLetIn(call, note, found.front());
 }
 
 /// Where no index is noted for the name, "/" is looked at in its place: the answer takes as long, and fails when others
@@ -27,7 +28,7 @@ std::optional<EnteredShare> EnterNamed(const CommandCall& call, Asker asker,
   };
   const auto found = std::find_if(listed.begin(), listed.end(), has_name);
   asker.share_root = found == listed.end() ? "/" : found->share->root;
-  const bool entered = CanEnter(call, asker);
+  const bool entered = CanEnter(call, asker, found == listed.end() ? nullptr : found->share.get());
   if (found == listed.end() || !entered) return std::nullopt;
   return EnteredShare{found->id, found->share, found->paused, std::move(asker)};
 }
@@ -46,6 +47,11 @@ std::optional<std::vector<std::string>> ReadShareNames(const Json::Value& data) 
   return names;
 }
 
+bool IsLetIn(const CommandCall& call, const ShareNote* note, const wire::LiveFile& root) {
+  if (!root.entered || note == nullptr) return false;
+  return call.named == nullptr || RulesLetIn(note->rules, *call.named);
+}
+
 std::vector<EnteredShare> EnteredShares(const CommandCall& call, const Asker& asker,
                                         const std::optional<std::vector<std::string>>& named) {
   const std::vector<Registry::Listed> listed = call.registry.List();
@@ -62,7 +68,8 @@ std::vector<EnteredShare> EnteredShares(const CommandCall& call, const Asker& as
     if (index.share == nullptr) continue;
     Asker here = asker;
     here.share_root = index.share->root;
-    if (CanEnter(call, here)) entered.push_back({index.id, index.share, index.paused, std::move(here)});
+    if (CanEnter(call, here, index.share.get()))
+      entered.push_back({index.id, index.share, index.paused, std::move(here)});
   }
   return entered;
 }

@@ -23,6 +23,11 @@ struct EnteredShare {
 /// The member "shares", each name once; nothing when it is absent. @throws Error kEngineBadRequest.
 std::optional<std::vector<std::string>> ReadShareNames(const Json::Value& data);
 
+/// Whether the asker of a request can enter a share: the look at its folder says so, and so do the share's rules where
+/// a program asks for a user by name. Everything that shows an asker anything of a share goes by this. `note` null:
+/// none.
+bool IsLetIn(const CommandCall& call, const ShareNote* note, const wire::LiveFile& root);
+
 /// The shares that the asker can enter now, those that are refused to ordinary users among them: of the `named` ones in
 /// their order, else of all in the order of their indices' ids.
 /// @throws Error kEngineNoSuchIndex when one that is named cannot be entered, or is none; kEngineRightsUnknown.

@@ -28,7 +28,7 @@ constexpr std::chrono::milliseconds kBetweenRounds(100);
 /// Those that the asker can enter; for whoever may see everything, all of which the engine knows.
 std::vector<EnteredShare> SharesFor(const CommandCall& call) {
   const std::optional<std::vector<std::string>> named = ReadShareNames(call.data);
-  const std::optional<Asker> asker = AskerOf(call.caller, call.data);
+  const std::optional<Asker> asker = AskerOf(call.caller, call.data, call.named);
   if (asker.has_value()) return EnteredShares(call, *asker, named);
   std::vector<EnteredShare> shares;
   for (const Registry::Listed& index : call.registry.List()) {
@@ -134,7 +134,7 @@ Json::Value RunFresh(CommandCall& call) {
   const auto end = std::chrono::steady_clock::now() + std::min<std::chrono::milliseconds>(timeout, kFreshLongest);
   std::vector<std::string> behind;
   for (const EnteredShare& share : SharesFor(call)) behind.push_back(share.note->share);
-  const std::optional<Asker> asker = AskerOf(call.caller, call.data);
+  const std::optional<Asker> asker = AskerOf(call.caller, call.data, call.named);
   const uint32_t uid = asker.has_value() ? asker->uid : call.caller.uid;
   while (!behind.empty()) {
     const FreshRounds::Answer answer = call.relay.Fresh().Await(uid, end);

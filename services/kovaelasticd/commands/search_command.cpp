@@ -146,7 +146,7 @@ Json::Value RunSearch(CommandCall& call) {
   SearchRequest request = ReadSearch(call.data);
   const QueryNode query = ParseQuery(RequiredText(call.data, "query"), Clock::Get().Now());
   request.query = &query;
-  const std::optional<Asker> asker = AskerOf(call.caller, call.data);
+  const std::optional<Asker> asker = AskerOf(call.caller, call.data, call.named);
   return asker.has_value() ? SearchForUser(call, *asker, request) : SearchEverything(call, request);
 }
 

@@ -6,6 +6,7 @@
 
 #include "base/path.h"
 #include "services/kovaelasticd/commands/commands.h"
+#include "services/kovaelasticd/commands/entered_shares.h"
 #include "services/kovaelasticd/commands/members.h"
 #include "services/kovaelasticd/commands/user_error.h"
 #include "services/kovaelasticd/commands/user_search.h"
@@ -61,7 +62,7 @@ Json::Value ShowTo(const CommandCall& call, Asker asker, const Candidate& candid
   const Registry::Listed& index = *candidate.index;
   asker.share_root = index.share->root;
   const std::vector<wire::LiveFile> live = call.look(asker, {asker.share_root, candidate.path});
-  if (live.size() != 2 || !live[0].entered || !live[1].readable) return {};
+  if (live.size() != 2 || !IsLetIn(call, index.share.get(), live[0]) || !live[1].readable) return {};
   const EnteredShare share{index.id, index.share, index.paused, asker};
   const Json::Value document = LoadDocument(*OpenForUser(call, share).index, candidate.path, with_text);
   if (!document.isMember(field::kAccess) || !document[fileindex::elastic::k_KOVAStamp].isString()) return {};
@@ -77,7 +78,7 @@ Json::Value ShowAll(const CommandCall& call, const Candidate& candidate, bool wi
 
 /// What can be shown; null for whatever reason it cannot. That the rights cannot be told fails all alike.
 Json::Value Find(const CommandCall& call, const std::string& path, bool with_text) {
-  const std::optional<Asker> asker = AskerOf(call.caller, call.data);
+  const std::optional<Asker> asker = AskerOf(call.caller, call.data, call.named);
   const std::vector<Registry::Listed> listed = call.registry.List();
   const std::vector<Candidate> candidates = CandidatesFor(path, listed);
   if (asker.has_value() && candidates.empty()) (void)call.look(Asker{asker->uid, asker->groups, "/"}, {"/", "/"});
