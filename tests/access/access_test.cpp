@@ -181,7 +181,7 @@ TEST_F(AccessProcessTest, OnlyTheThreadAtWorkHasTheIds) {
 }
 
 TEST_F(AccessProcessTest, WhatCannotBeToldIsAFailure) {
-  const auto code = [this](uint32_t uid, const std::vector<uint32_t>& groups) {
+  const auto code = [](uint32_t uid, const std::vector<uint32_t>& groups) {
     try {
       (void)wire::LookAs(uid, groups, "/", {"/"}, kLongest);
       return 0;
