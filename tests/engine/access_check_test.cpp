@@ -28,8 +28,8 @@ constexpr size_t kFiles = 250, kAskers = 24;
 class RandomRights {
  public:
   uint32_t Id() { return kIds + random_() % 4; }
-  AccessRecord Record() {
-    AccessRecord record;
+  base::AccessRecord Record() {
+    base::AccessRecord record;
     record.uid = Id();
     record.gid = Id();
     record.mode = static_cast<uint16_t>(random_() % 01000);
@@ -38,9 +38,9 @@ class RandomRights {
     std::set<uint32_t> users, groups;
     for (size_t i = random_() % 3; i > 0; --i) users.insert(Id());
     for (size_t i = random_() % 4; i > 0; --i) groups.insert(Id());
-    for (const uint32_t id : users) record.acl.push_back({AclEntry::Kind::kUser, Bits(), id});
-    record.acl.push_back({AclEntry::Kind::kOwningGroup, Bits(), 0});
-    for (const uint32_t id : groups) record.acl.push_back({AclEntry::Kind::kGroup, Bits(), id});
+    for (const uint32_t id : users) record.acl.push_back({base::AclEntry::Kind::kUser, Bits(), id});
+    record.acl.push_back({base::AclEntry::Kind::kOwningGroup, Bits(), 0});
+    for (const uint32_t id : groups) record.acl.push_back({base::AclEntry::Kind::kGroup, Bits(), id});
     return record;
   }
   Asker User() {
@@ -55,7 +55,7 @@ class RandomRights {
 };
 
 /// The attribute that an ACL is set by.
-std::string AclAttribute(const AccessRecord& record) {
+std::string AclAttribute(const base::AccessRecord& record) {
   std::string bytes("\2\0\0\0", 4);
   const auto add = [&bytes](uint16_t tag, unsigned permissions, uint32_t id = UINT32_MAX) {
     const auto allowed = static_cast<uint16_t>(permissions & 7);
@@ -63,11 +63,11 @@ std::string AclAttribute(const AccessRecord& record) {
     bytes.append(reinterpret_cast<const char*>(&id), 4);
   };
   add(0x01, record.mode >> 6U);
-  for (const AclEntry& entry : record.acl) {
-    if (entry.kind == AclEntry::Kind::kOwningGroup) {
+  for (const base::AclEntry& entry : record.acl) {
+    if (entry.kind == base::AclEntry::Kind::kOwningGroup) {
       add(0x04, entry.permissions);
     } else {
-      add(entry.kind == AclEntry::Kind::kUser ? 0x02 : 0x08, entry.permissions, entry.id);
+      add(entry.kind == base::AclEntry::Kind::kUser ? 0x02 : 0x08, entry.permissions, entry.id);
     }
   }
   add(0x10, record.mode >> 3U);
@@ -112,10 +112,10 @@ TEST(AccessCheckTest, GivesWhatTheKernelGives) {
   ASSERT_EQ(0, chmod(dir.Path().c_str(), 0755));
   RandomRights random;
   std::vector<std::string> paths;
-  std::vector<AccessRecord> records;
+  std::vector<base::AccessRecord> records;
   for (size_t i = 0; i < kFiles; ++i) {
     const std::string& path = paths.emplace_back(dir / std::to_string(i));
-    const AccessRecord& record = records.emplace_back(random.Record());
+    const base::AccessRecord& record = records.emplace_back(random.Record());
     ASSERT_EQ(0, i % 2 == 0 ? mkdir(path.c_str(), 0700) : mknod(path.c_str(), S_IFREG | 0600, 0));
     ASSERT_EQ(0, chown(path.c_str(), record.uid, record.gid));
     ASSERT_EQ(0, chmod(path.c_str(), record.mode));
@@ -134,7 +134,7 @@ TEST(AccessCheckTest, GivesWhatTheKernelGives) {
     for (size_t i = 0; i < kFiles; ++i) {
       const uint8_t asked = i % 2 == 0 ? kMayRead | kMayEnter : kMayRead;  // only a folder can be entered
       ASSERT_EQ(seen[i], PermissionsOf(records[i], asker) & asked)
-          << AccessText(records[i]) << " uid " << asker.uid << " groups " << testing::PrintToString(asker.groups);
+          << base::AccessText(records[i]) << " uid " << asker.uid << " groups " << testing::PrintToString(asker.groups);
       granted += seen[i] != 0 ? 1 : 0;
     }
   }

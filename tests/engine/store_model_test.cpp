@@ -171,8 +171,9 @@ class StoreModel {
     Database database(folder_ / "index.sqlite", Database::Mode::kRead);
     FolderTree tree(database);
     std::map<int64_t, std::string> records = {{0, ""}};
-    ReadAccessRecords(database, 1, 1000,
-                      [&](const AccessRecord& record) { records[record.number] = AccessText(record); });
+    ReadAccessRecords(database, 1, 1000, [&](int64_t number, const base::AccessRecord& record) {
+      records[number] = base::AccessText(record);
+    });
     for (const auto& [path, file] : committed_) {
       for (size_t end = path.rfind('/'); end > 0; end = path.rfind('/', end - 1)) {
         const auto own = committed_.find(path.substr(0, end));

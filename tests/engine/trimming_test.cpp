@@ -31,7 +31,7 @@ const char* const kRecords[] = {"0:0:0755",
                                 ""};
 
 bool Gives(const std::string& access, uint8_t permission) {
-  const auto record = ParseAccess(access);
+  const auto record = base::ParseAccess(access);
   return record.has_value() && (PermissionsOf(*record, kAsker) & permission) != 0;
 }
 

@@ -6,17 +6,22 @@
 #include <chrono>
 #include <cstddef>
 #include <cstdint>
-#include <cstdio>
 #include <optional>
 #include <string_view>
+#include <utility>
+#include <vector>
 
 #include <kova/content_extract.h>
+
+#include "base/access_record.h"
 
 namespace kova::content {
 
 namespace {
 
+using base::AclEntry;
 using std::chrono::steady_clock;
+using Acl = std::vector<AclEntry>;
 
 constexpr char kAclName[] = "system.posix_acl_access";
 constexpr size_t kUsualAclBytes = 1024;
@@ -37,44 +42,47 @@ uint32_t Number(std::string_view bytes, size_t at, size_t size) {
   return number;
 }
 
-/// The entries beyond owner, mask and others, which the mode has; "" where there are none, nothing for what is no ACL.
-std::optional<std::string> AclText(std::string_view acl) {
+/// The entries beyond owner, mask and others, which the mode has; none where that is all, nothing for what is no ACL.
+std::optional<Acl> ReadEntries(std::string_view acl) {
   if (acl.size() < kHeaderBytes || (acl.size() - kHeaderBytes) % kEntryBytes != 0) return {};
   if (Number(acl, 0, 4) != kAclVersion) return {};
-  std::string text;
+  Acl entries;
   bool is_extended = false;
   for (size_t at = kHeaderBytes; at < acl.size(); at += kEntryBytes) {
     const uint32_t tag = Number(acl, at, 2);
-    const uint32_t allowed = Number(acl, at + 2, 2);
-    if (allowed > 07) return {};
+    const auto allowed = static_cast<uint8_t>(Number(acl, at + 2, 2));
+    if (Number(acl, at + 2, 2) > 07) return {};
     if (tag == kOwner || tag == kOther) continue;
     is_extended = is_extended || tag != kOwningGroup;
     if (tag == kMask) continue;
     if (tag != kUser && tag != kOwningGroup && tag != kGroup) return {};
-    text += std::string(text.empty() ? "" : ",") + (tag == kUser ? "u" : "g");
-    if (tag != kOwningGroup) text += std::to_string(Number(acl, at + 4, 4));
-    text += "=" + std::to_string(allowed);
+    if (tag == kOwningGroup) {
+      entries.push_back({AclEntry::Kind::kOwningGroup, allowed, 0});
+    } else {
+      entries.push_back(
+          {tag == kUser ? AclEntry::Kind::kUser : AclEntry::Kind::kGroup, allowed, Number(acl, at + 4, 4)});
+    }
   }
-  return is_extended ? text : "";
+  return is_extended ? entries : Acl();
 }
 
-/// The ACL of the file; "" where it has none, nothing when that cannot be found out.
-std::optional<std::string> ReadAcl(const std::string& path, dev_t device) {
+/// The ACL of the file; empty where it has none, nothing when that cannot be found out.
+std::optional<Acl> ReadAcl(const std::string& path, dev_t device) {
   thread_local dev_t without = 0;  // the last file system that has no ACLs
   thread_local steady_clock::time_point until;
-  if (device == without && steady_clock::now() < until) return "";
+  if (device == without && steady_clock::now() < until) return Acl();
   std::string acl(kUsualAclBytes, '\0');
   ssize_t size = lgetxattr(path.c_str(), kAclName, acl.data(), acl.size());
   if (size < 0 && errno == ERANGE) {
     acl.resize(kAclBytesMax);
     size = lgetxattr(path.c_str(), kAclName, acl.data(), acl.size());
   }
-  if (size >= 0) return AclText(std::string_view(acl).substr(0, static_cast<size_t>(size)));
-  if (errno == ENODATA) return "";
+  if (size >= 0) return ReadEntries(std::string_view(acl).substr(0, static_cast<size_t>(size)));
+  if (errno == ENODATA) return Acl();
   if (errno != ENOTSUP) return {};
   without = device;
   until = steady_clock::now() + kNoAclsRemembered;
-  return "";
+  return Acl();
 }
 
 }  // namespace
@@ -83,11 +91,9 @@ std::optional<std::string> ReadAcl(const std::string& path, dev_t device) {
 /// known: both count as what nobody may read.
 std::string AccessRecord(const std::string& path, const Rights& rights) {
   const bool is_readable = S_ISREG(rights.mode) || S_ISDIR(rights.mode);
-  const std::optional<std::string> acl = is_readable ? ReadAcl(path, rights.device) : std::nullopt;
-  char text[48];
-  (void)snprintf(text, sizeof(text), "%ju:%ju:%04o", static_cast<uintmax_t>(rights.owner),
-                 static_cast<uintmax_t>(rights.group), acl.has_value() ? rights.mode & 07777U : 0);
-  return acl.value_or("").empty() ? text : text + (":" + *acl);
+  std::optional<Acl> acl = is_readable ? ReadAcl(path, rights.device) : std::nullopt;
+  const auto mode = static_cast<uint16_t>(acl.has_value() ? rights.mode & 07777U : 0);
+  return base::AccessText({rights.owner, rights.group, mode, std::move(acl).value_or(Acl())});
 }
 
 std::string AccessRecord(const std::string& path) {

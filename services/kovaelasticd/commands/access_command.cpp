@@ -1,8 +1,8 @@
+#include "base/access_record.h"
 #include "base/file_stamp.h"
 #include "common/log.h"
 #include "services/kovaelasticd/commands/commands.h"
 #include "services/kovaelasticd/commands/members.h"
-#include "services/kovaelasticd/store/access_records.h"
 
 namespace ferrox::engine {
 
@@ -27,7 +27,7 @@ std::vector<AccessChange> ReadRecords(const Json::Value& records) {
     try {
       AccessChange change = ReadRecord(record);
       const bool known = !changes.empty() && changes.back().access == change.access;
-      if (!known && !ParseAccess(change.access).has_value()) RefuseMember("access", kAccessSpelling);
+      if (!known && !base::ParseAccess(change.access).has_value()) RefuseMember("access", base::kAccessSpelling);
       changes.push_back(std::move(change));
     } catch (const Error& error) {
       throw Error(Error::kEngineBadRequest,

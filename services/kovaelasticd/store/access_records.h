@@ -2,44 +2,19 @@
 
 #include <cstdint>
 #include <functional>
-#include <optional>
 #include <string>
-#include <string_view>
 #include <unordered_map>
-#include <vector>
 
 #include <json/value.h>
 
+#include "base/access_record.h"
 #include "services/kovaelasticd/store/sqlite_db.h"
 
 namespace ferrox::engine {
 
-/// An entry of a POSIX ACL that a file's mode does not tell: the mode's bits are its owner, mask and other.
-struct AclEntry {
-  enum class Kind : uint8_t { kUser, kOwningGroup, kGroup };
-  Kind kind;
-  uint8_t permissions;  ///< 4 read, 2 write, 1 execute
-  uint32_t id;          ///< of the user or group; 0 for kOwningGroup
-};
-
-/// Who may do what with a file: the member "_KOVAAccess", `UID:GID:MODE` or `UID:GID:MODE:ACL`.
-struct AccessRecord {
-  int64_t number = 0;  ///< in the table "access"
-  uint32_t uid = 0;
-  uint32_t gid = 0;
-  uint16_t mode = 0;          ///< permission bits: 07777 at most
-  std::vector<AclEntry> acl;  ///< in the kernel's order: users, owning group, groups; empty: the mode tells all
-};
-
-/// What a record must be, for refusals.
-inline constexpr char kAccessSpelling[] = "a text like 1000:100:0640 or 1000:100:0640:u5001=4,g=4,g200=6";
-/// Nothing when the text is no record, or not spelt as AccessText spells it.
-std::optional<AccessRecord> ParseAccess(std::string_view text);
-std::string AccessText(const AccessRecord& record);
-
 /// Reads the records with the numbers from `first` to `last`, in their order. @throws Error kEngineStorage.
 void ReadAccessRecords(Database& database, int64_t first, int64_t last,
-                       const std::function<void(const AccessRecord&)>& take);
+                       const std::function<void(int64_t number, const base::AccessRecord&)>& take);
 
 /// The table "access" as the thread that writes uses it: each distinct record once, by the number that documents and
 /// folders refer to it by. Numbers count from 1 and never change; records that nothing refers to any more stay, since

@@ -66,8 +66,8 @@ std::shared_ptr<const ReadableDocuments> ReadableDocuments::Make(Database& datab
 void ReadableDocuments::ReadRecords(Database& database, const Asker& asker) {
   if (permissions_.empty()) permissions_.push_back(0);
   ReadAccessRecords(database, static_cast<int64_t>(permissions_.size()), Place::kAccessMax,
-                    [&](const AccessRecord& record) {
-                      permissions_.resize(static_cast<size_t>(record.number) + 1, 0);
+                    [&](int64_t number, const base::AccessRecord& record) {
+                      permissions_.resize(static_cast<size_t>(number) + 1, 0);
                       permissions_.back() = PermissionsOf(record, asker);
                     });
 }
