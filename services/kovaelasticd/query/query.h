@@ -35,6 +35,7 @@ struct QueryNode {
   std::string text;  ///< as written, without quotes
   bool phrase = false;
   bool prefix = false;
+  bool required = false;  ///< of kText: every hit must have it; else documents without it are found too, further behind
   std::vector<std::string> fields;
   std::vector<int32_t> kinds;
   int64_t low = std::numeric_limits<int64_t>::min();

@@ -71,10 +71,26 @@ struct SearchRequest {
   SortKey sort = SortKey::kRelevance;
   bool ascending = false;
   bool snippet = true;
+  bool all_words = false;      ///< every word of the query is needed, as if each were required
+  bool explain = false;        ///< hits tell what their score is made of
   size_t ranked_max = 200000;  ///< so many documents, the newest added, are ranked at most for one word
   std::string mark_start = "[";
   std::string mark_end = "]";
   const Asker* asker = nullptr;  ///< lives as long as the search; null: whoever asks may read everything
+};
+
+/// What one word of a query, or something else about a document, adds to its score.
+struct ScorePart {
+  std::string what;   ///< the word as it was found, or "recent" and the like
+  std::string where;  ///< "name", "title", "text", "folder" ...; "" for what is no word
+  double adds = 0;
+};
+
+/// A word of a query that was looked for in another spelling.
+struct RepairedWord {
+  std::string from;   ///< as it was typed, folded
+  std::string to;     ///< a word of documents that whoever asks may read
+  bool also = false;  ///< `from` itself is found too: its hits come first
 };
 
 /// A document that was found, as it is shown.
@@ -87,10 +103,16 @@ struct SearchHit {
   Json::Value fields;
   std::string stamp = {};  ///< "_KOVAStamp"; "": it has none
   bool is_folder = false;
+  std::string title = {};                   ///< of its text; "": it has none
+  std::vector<ScorePart> explanation = {};  ///< when it was asked for, what adds most first
 };
 
 struct SearchReply {
   int64_t total = 0;                     ///< all documents found, whether shown or not
+  std::optional<int64_t> total_all;      ///< of these, those with all words; nothing where all have them anyway
+  std::vector<std::string> ignored;      ///< words in so many documents that they were passed over
+  std::vector<RepairedWord> repaired;    ///< in the order of the query
+  bool none_has_all = false;             ///< all_words was asked for, no document has all, and some words sufficed
   bool ranking_bounded = false;          ///< there were more than ranked_max to order; some were left out of that
   std::vector<SearchHit> hits;           ///< from the first, offset + limit of them at most
   std::vector<std::string> suggestions;  ///< other spellings, when nothing was found
