@@ -75,6 +75,7 @@ bool TakeSection(const SmbConf& conf, const std::string& section, ShareEntry& sh
   // Samba lets nobody write unless "read only" is off. Whether the host itself can write depends on the volume.
   share.ftp_privilege = SmbConf::Boolean(value("read only")) == false ? 2 : 1;
   share.users = SambaUsers(conf, section);
+  share.names = SambaNames(conf, section);
   share.foreign_rights = SambaRightsProblem(conf, section);
   if (!HasRecycle(value("vfs objects"))) return true;
   share.recycle = RecycleFolder(value("recycle:repository"));

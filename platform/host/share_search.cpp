@@ -22,11 +22,15 @@ Json::Value NameList(const std::vector<std::string>& names) {
   return list;
 }
 
-Json::Value RulesOf(const ShareUsers& users) {
+Json::Value RulesOf(const ShareUsers& users, const ShareNames& names) {
   Json::Value rules;
   rules["valid_users"] = NameList(users.valid);
   rules["invalid_users"] = NameList(users.invalid);
-  if (!users.closed.empty()) rules["closed"] = users.closed;
+  rules["veto_files"] = NameList(names.veto);
+  rules["hide_files"] = NameList(names.hide);
+  if (names.case_counts) rules["case_counts"] = true;
+  const std::string& closed = users.closed.empty() ? names.closed : users.closed;
+  if (!closed.empty()) rules["closed"] = closed;
   return rules;
 }
 
@@ -76,7 +80,7 @@ bool FindShareForSearch(const std::string& name, ShareForSearch& found) {
   if (entry == nullptr) return false;
   found.root = entry->path;
   found.refused = entry->foreign_rights.empty() ? RightsProblemAt(entry->path) : entry->foreign_rights;
-  found.rules = RulesOf(entry->users);
+  found.rules = RulesOf(entry->users, entry->names);
   return true;
 }
 

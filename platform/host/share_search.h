@@ -11,8 +11,8 @@ namespace kova::host {
 struct ShareForSearch {
   std::string root;     ///< its folder
   std::string refused;  ///< why ordinary users may not search it, a sentence without its end; empty: they may
-  /// For users for whom another program asks: {"valid_users": [NAME...], "invalid_users": [NAME...], "closed"?:
-  /// reason}.
+  /// For users for whom another program asks: {"valid_users": [NAME...], "invalid_users": [NAME...], "veto_files":
+  /// [PATTERN...], "hide_files": [PATTERN...], "case_counts"?: true, "closed"?: reason}.
   Json::Value rules;
 };
 

@@ -31,16 +31,6 @@ StatCache<ShareTable>& Cache() {
   return *cache;
 }
 
-/// Names of files as Samba's lists have them, "/.DS_Store/~*/"; nothing here goes by them.
-bool ReadPatterns(const Json::Value& object) {
-  for (const char* member : {"veto_files", "hide_files"}) {
-    std::string patterns;
-    if (!ReadMember(object, member, patterns)) return false;
-    if (!patterns.empty() && (patterns.size() < 2 || patterns.front() != '/' || patterns.back() != '/')) return false;
-  }
-  return true;
-}
-
 /// What is wrong with a list of users; empty when nothing is. A group of the table is one of the name service: only
 /// Samba has netgroups.
 std::string CheckUserNames(std::vector<std::string>& names) {
@@ -62,13 +52,15 @@ std::string ReadEntry(const Json::Value& object, ShareEntry& entry) {
                     ReadMember(object, "ftp_privilege", entry.ftp_privilege) &&
                     ReadMember(object, "valid_users", entry.users.valid) &&
                     ReadMember(object, "invalid_users", entry.users.invalid);
-  if (!read || !ReadPatterns(object)) return "has a member of the wrong type";
+  if (!read) return "has a member of the wrong type";
+  std::string problem = ReadNames(object, entry.names);
+  if (!problem.empty()) return problem;
   for (std::vector<std::string>* names : {&entry.users.valid, &entry.users.invalid}) {
-    const std::string problem = CheckUserNames(*names);
+    problem = CheckUserNames(*names);
     if (!problem.empty()) return "has a list of users that " + problem;
   }
   while (entry.path.size() > 1 && entry.path.back() == '/') entry.path.pop_back();
-  const std::string problem = ShareTextProblem(entry.name, entry.path);
+  problem = ShareTextProblem(entry.name, entry.path);
   return problem.empty() ? problem : "is not valid: " + problem;
 }
 

@@ -7,6 +7,7 @@
 #include <unordered_map>
 #include <vector>
 
+#include "platform/host/share_names.h"
 #include "platform/host/share_users.h"
 
 /// The host's shares: the JSON array in "/etc/kova/shares.json" below the instance's root. Each element is an object:
@@ -29,6 +30,7 @@ struct ShareEntry {
   bool hide_unreadable = false;
   uint32_t ftp_privilege = 2;
   ShareUsers users = {};
+  ShareNames names = {};
   /// Why the rights of its files do not tell who may read it, as far as its configuration shows; empty when they do.
   std::string foreign_rights = {};
   bool from_samba = false;  ///< read from Samba's configuration, not from the table

@@ -126,16 +126,34 @@ size_t SmbConf::TakeParameter(size_t begin) {
 
 bool SmbConf::HasSection(const std::string& section) const { return headers_.count(Fold(section)) != 0; }
 
-std::optional<std::string> SmbConf::Get(const std::string& section, const std::string& parameter) const {
+/// The line whose value holds in a section; null when there is none.
+const SmbConf::Line* SmbConf::Find(const std::string& section, const std::string& parameter) const {
   const std::string name = FoldParameter(parameter), folded = Fold(section);
   const auto own = values_.find(ValueKey(folded, name));
-  if (own != values_.end()) return lines_[own->second.back()].value;
+  if (own != values_.end()) return &lines_[own->second.back()];
   const auto global = values_.find(ValueKey(kGlobal, name));
   const auto header = headers_.find(folded);
-  if (global == values_.end() || header == headers_.end()) return {};
+  if (global == values_.end() || header == headers_.end()) return nullptr;
   const auto above = std::lower_bound(global->second.begin(), global->second.end(), header->second);
-  if (above == global->second.begin()) return {};
-  return lines_[*std::prev(above)].value;
+  return above == global->second.begin() ? nullptr : &lines_[*std::prev(above)];
+}
+
+std::optional<std::string> SmbConf::Get(const std::string& section, const std::string& parameter) const {
+  const Line* const line = Find(section, parameter);
+  return line != nullptr ? std::optional(line->value) : std::nullopt;
+}
+
+std::optional<std::string> SmbConf::Written(const std::string& section, const std::string& parameter) const {
+  const Line* const line = Find(section, parameter);
+  if (line == nullptr) return std::nullopt;
+  return text_.substr(line->value_begin, line->value_end - line->value_begin);
+}
+
+bool SmbConf::HasBeginning(const std::string& section, const std::string& begin) const {
+  const std::string folded = Fold(section), name = FoldParameter(begin);
+  return std::any_of(lines_.begin(), lines_.end(), [&](const Line& line) {
+    return line.name.starts_with(name) && (line.section == folded || line.section == kGlobal);
+  });
 }
 
 bool SmbConf::IsOn(const std::string& section, const std::string& parameter) const {

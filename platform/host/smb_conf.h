@@ -24,7 +24,11 @@ class SmbConf {
 
   /// The value that holds in a section; nothing when neither it nor "global" above it has one.
   std::optional<std::string> Get(const std::string& section, const std::string& parameter) const;
+  /// The same with its blanks as they are written.
+  std::optional<std::string> Written(const std::string& section, const std::string& parameter) const;
   bool IsOn(const std::string& section, const std::string& parameter) const;
+  /// Whether a section, or "global", has a parameter whose name begins so.
+  bool HasBeginning(const std::string& section, const std::string& begin) const;
   /// Each value that a parameter has anywhere.
   std::vector<std::string> All(const std::string& parameter) const;
 
@@ -47,6 +51,7 @@ class SmbConf {
   };
 
   void Parse();
+  const Line* Find(const std::string& section, const std::string& parameter) const;
   size_t TakeHeader(size_t begin);
   size_t TakeParameter(size_t begin);
   size_t LogicalEnd(size_t begin) const;

@@ -259,6 +259,26 @@ TEST_F(HostSambaTest, ShareRulesAreReadOrCloseTheShare) {
   EXPECT_FALSE(kova::host::SambaUsers(everywhere, "s").closed.empty());
 }
 
+TEST(ShareNamesTest, PatternsAreReadOrCloseTheShare) {
+  const struct {
+    const char *lines, *told;  ///< vetoed; hidden; or why it is closed
+  } rows[] = {{"", ";"},
+              {"veto files = /*.tmp/two  blanks/", "*.tmp|two  blanks|;"},
+              {"hide files = one//?x\ncase sensitive = yes", ";one|?x|case"},
+              {"veto files = /100%/", "\"veto files\" has a macro"},
+              {"hide files = /a/\nhide files : ann = /b/", "\"hide files\" differs from user to user"}};
+  for (const auto& row : rows) {
+    const SmbConf conf(string("[global]\n[s]\n") + row.lines + "\n[t]\nveto files = /%U/\n");
+    const kova::host::ShareNames names = kova::host::SambaNames(conf, "s");
+    string told;
+    for (const string& pattern : names.veto) told += pattern + "|";
+    told += ";";
+    for (const string& pattern : names.hide) told += pattern + "|";
+    told += names.case_counts ? "case" : "";
+    EXPECT_NE(string::npos, (names.closed.empty() ? told : names.closed).find(row.told)) << row.lines << ": " << told;
+  }
+}
+
 TEST_F(HostSambaTest, TheSearchEngineIsToldOfSambasRulesAndOfTheTables) {
   const string testparm = Program("testparm", "exec cat " + conf_);
   WriteFile(conf_, "[video]\n valid users = ann\n path = " + Folder("video") + "\n");
@@ -275,7 +295,14 @@ TEST_F(HostSambaTest, TheSearchEngineIsToldOfSambasRulesAndOfTheTables) {
   };
   ASSERT_TRUE(write(R"("valid_users": ["ann", "@staff"], "veto_files": "/.x*/")"));
   EXPECT_EQ("+staff", found.rules["valid_users"][1].asString()) << "no netgroup: only Samba has those";
-  for (const char* damaged : {R"("valid_users": "ann")", R"("invalid_users": ["&net"])", R"("veto_files": ".x")"}) {
+  EXPECT_EQ(".x*", found.rules["veto_files"][0].asString());
+  const string too_many = "\"hide_files\": \"/" + [] {
+    string list;
+    for (int i = 0; i < 1001; ++i) list += "a/";
+    return list;
+  }() + "\"";
+  for (const string& damaged : {string(R"("valid_users": "ann")"), string(R"("invalid_users": ["&net"])"),
+                                string(R"("veto_files": ".x")"), too_many}) {
     EXPECT_FALSE(write(damaged)) << damaged;
   }
   std::filesystem::remove(table);
