@@ -5,6 +5,8 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <filesystem>
+#include <iterator>
 #include <string>
 
 #include <gtest/gtest.h>
@@ -14,6 +16,8 @@
 namespace ferrox::test {
 
 bool InChild(bool privately, const std::function<void()>& body) {
+  const std::filesystem::directory_iterator threads("/proc/self/task");
+  EXPECT_EQ(1, std::distance(begin(threads), end(threads))) << "a child would have the locks that other threads hold";
   const uid_t uid = geteuid();
   const gid_t gid = getegid();
   const pid_t child = fork();
