@@ -58,6 +58,8 @@ CommandGroup Searching() {
             {"--limit", "N", "show at most so many hits (default 10, at most 1000)"},
             {"--offset", "N", "leave out the first N hits"},
             {"--sort", "relevance|date|name|size", "the order (default: relevance)"},
+            {"--all-words", nullptr, "show only files with all the words, if there are any"},
+            {"--explain", nullptr, "tell for each hit which words matched where, and what each added to its score"},
             {"--fresh", "[=SECONDS]",
              "wait until all that was changed before can be found (default 30); leaves out what is not sure"},
             {"--partial", nullptr, "exit code 0 or 1 whatever is left out; with --fresh shows what is not sure too"},

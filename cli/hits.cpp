@@ -7,6 +7,7 @@
 #include "cli/escape.h"
 #include "cli/format.h"
 #include "cli/output.h"
+#include "cli/search_notes.h"
 #include "fileindex/elastic/elastic_control.h"
 #include "fileindex/util.h"
 #include "wire/fields.h"
@@ -64,16 +65,19 @@ std::string ShowSnippet(const std::string& snippet, bool on_terminal) {
   return shown.substr(0, shown.size() - end);
 }
 
-/// The path, what matched in the text, and a line of facts.
+/// The path, the title, what matched in the text, a line of facts, and what the score is made of where it is told.
 void PrintHit(const Json::Value& hit, bool on_terminal) {
   const Json::Value& fields = hit["fields"];
   const std::string path = TextOf(hit, "doc_id");
   const std::string shown = EscapeForTerminal(path);
   (void)printf("%s\n", on_terminal ? ("\033[36m" + shown + "\033[0m").c_str() : shown.c_str());
+  const std::string title = TitleToShow(hit, path);
+  if (!title.empty()) (void)printf("    %s\n", title.c_str());
   const std::string snippet = TextOf(hit, "snippet");
   if (!snippet.empty()) (void)printf("    %s\n", ShowSnippet(snippet, on_terminal).c_str());
   (void)printf("    %s, %s, %s\n", KindOf(fields, path).c_str(), Size(IntOf(fields, field::kKOVAMDFSSize)).c_str(),
                Date(IntOf(fields, field::kKOVAMDFSContentChangeDate)).c_str());
+  PrintExplanation(hit);
 }
 
 /// Whether hits follow behind those of this page. Of a user's page all may be gone that were to be shown: files that
@@ -95,15 +99,6 @@ void PrintSummary(const Json::Value& result, uint64_t offset) {
   (void)printf("\n");
 }
 
-/// On standard error, with words of the index that are spelt alike.
-void PrintNothingFound(const Json::Value& result, bool complete) {
-  std::string similar;
-  for (const Json::Value& word : result["suggestions"]) {
-    if (word.isString()) similar += (similar.empty() ? "; there is: " : ", ") + EscapeForTerminal(word.asString());
-  }
-  (void)fprintf(stderr, "%s%s\n", complete ? "nothing found" : "no hit in what was searched", similar.c_str());
-}
-
 }  // namespace
 
 Json::Value SearchMembers(const Arguments& arguments) {
@@ -113,6 +108,8 @@ Json::Value SearchMembers(const Arguments& arguments) {
   data["offset"] = Json::Int64(arguments.Number("--offset", 0, 0, kOffsetMax));
   data["sort"] = arguments.Get("--sort", "relevance");
   data["snippet"] = true;
+  if (arguments.Has("--all-words")) data["all_words"] = true;
+  if (arguments.Has("--explain")) data["explain"] = true;
   const bool json = arguments.Has("--json");
   data["mark_start"] = json ? "[" : std::string(1, kMarkStart);
   data["mark_end"] = json ? "]" : std::string(1, kMarkEnd);
@@ -141,6 +138,7 @@ int PrintFound(const Arguments& arguments, Found found) {
     PrintJson(result);
   } else if (hits > 0 || HasMore(result, offset)) {
     const bool on_terminal = isatty(STDOUT_FILENO) == 1;
+    PrintHowSearched(result);
     for (const Json::Value& hit : result["hits"]) PrintHit(hit, on_terminal);
     PrintSummary(result, offset);
   } else if (found.searched) {

@@ -351,6 +351,30 @@ class ToolTest(unittest.TestCase):
             daemon.close()
             self.assertEqual(bounded, b"so many match that only a part was ranked" in shown)
 
+    def test_search_says_how_words_were_taken(self):
+        hits = [{"doc_id": "/v/a.txt", "title": "The Licence\x1b", "score": 2.5, "fields": {},
+                 "explain": [{"what": "license", "where": "title", "adds": 2.25}, {"what": "recent", "adds": 0.25}]},
+                {"doc_id": "/v/Notes.txt", "title": "notes", "fields": {}}]
+        repaired = [{"from": "lincense", "to": "license"}, {"from": "lincense", "to": "licence"},
+                    {"from": "bok", "to": "book", "also": True}]
+        answer = {"total": 1340, "total_all": 12, "ignored": ["how", "do"], "repaired": repaired, "hits": hits}
+        engine = self.daemon("kovaelasticd", search=lambda data: success(answer))
+        shown = self.run_tool("search", "--all-words", "--explain", "x").stdout.decode()
+        self.assertTrue(engine.asked[0][1]["all_words"] and engine.asked[0][1]["explain"])
+        self.assertTrue(shown.startswith(
+            'searched for "lincense" as "license" or "licence"\nalso searched for "bok" as "book"\n'
+            "passed over, since too many files have them: how, do\n12 with all words, 1,340 with some\n"
+            "/v/a.txt\n    The Licence\\x1B\n    document, "), shown)
+        self.assertIn("\n    score 2.50\n      +2.25  license in title\n      +0.25  recent\n/v/Notes.txt\n    doc", shown)
+        self.assertLessEqual(answer.items(), json.loads(self.run_tool("search", "--json", "x").stdout).items())
+        for total_all, none_has_all, line in ((0, False, "no file has all words, 1,340 with some"),
+                                              (None, True, "no file has all words; these have some")):
+            answer = {"total": 1340, "hits": hits, "none_has_all": none_has_all}
+            answer |= {} if total_all is None else {"total_all": total_all}
+            self.assertTrue(self.run_tool("search", "x").stdout.decode().startswith(line + "\n/v/a"))
+        answer = {"total": 0, "hits": [], "suggestions": ["runs"]}
+        self.assertIn(b"nothing found. Did you mean: runs?\n", self.run_tool("search", "x").stderr)
+
     def test_status_tells_how_changes_are_noticed(self):
         shares = [{"share": name, "path": "/v/" + name, "queue": "/q/" + name, "state": "idle", "oldest_change": 2000,
                    "failures": {}, "index": {"error": {"code": 1407, "msg": name + " is torn"}}}

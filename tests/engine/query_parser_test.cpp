@@ -37,17 +37,22 @@ TEST_F(QueryParserTest, Structure) {
     const char* tree;
   } kRows[] = {
       {"fox", "fox"},
-      {"quick AND fox", "(and quick fox)"},
-      {"a OR b c", "(or a (and b c))"},
-      {"(a OR b) c", "(and (or a b) c)"},
+      {"quick fox +den +\"big hole\"", "(and quick fox +den +\"big hole\")"},
+      {"quick AND fox den", "(and +quick +fox +den)"},
+      {"a OR b c", "(or +a (and +b +c))"},
+      {"(a OR b) c", "(and (or +a +b) c)"},
       {"-a b", "(and (not a) b)"},
-      {"-(a OR b)", "(not (or a b))"},
-      {"a -\"b c\"", "(and a (not \"b c\"))"},
+      {"-(a OR b)", "(not (or +a +b))"},
+      {"a -\"b c\"", "(and a (not +\"b c\"))"},
       {"well-known e-mail", "(and well-known e-mail)"},
       {"or not and", "(and or not and)"},
-      {"con* \"big hou\"*", "(and con* \"big hou\"*)"},
-      {"a & b - c", "(and a b c)"},
-      {"((a))", "a"},
+      {"con* \"big hou\"*", "(and con* +\"big hou\"*)"},
+      {"a & b - c + -- ---- (-)", "(and a b c)"},
+      {"++a +(b c) +-d +kind:other", "(and +a (and +b +c) (not +d) kind:4)"},
+      {"((a)) b (c name:d)", "(and +a b (and +c name:d))"},
+      {"iban DE89 3704 0044 b", "(and iban [DE89 3704 0044] DE89 3704 0044 b)"},
+      {"+49 (89) - 1234 +7 x1 x", "(and [+49 (89) - 1234] 49 89 1234 [+7 x1] 7 x1 x)"},
+      {"+2019 b 7 AND 8", "(and +2019 +b +7 +8)"},
       {"name:report title:\"annual report\" name:*.jpg",
        "(and name:report KOVAMDTitle|KOVAMDHeadline:\"annual report\" "
        "name:.jpg)"},
@@ -56,7 +61,7 @@ TEST_F(QueryParserTest, Structure) {
       {"path:/volume1/photo/ path:\"/a b\"", "(and path:/volume1/photo path:/a b)"},
       {"owner:1000 owner:root", "(and KOVAMDOwnerUserID:1000 KOVAMDOwnerUserID:0)"},
       {"\"\" a \"", "!"},
-      {"\"date:7d\"", "\"date:7d\""},
+      {"\"date:7d\"", "+\"date:7d\""},
       {"東京 都", "(and 東京 都)"},
   };
   for (const auto& row : kRows) {
@@ -106,7 +111,8 @@ TEST_F(QueryParserTest, RefusalsNameThePlaceAndTheRemedy) {
     const char* place;
     const char* part;
   } kRows[] = {
-      {"", "character 1:", "nothing to look for"},
+      {"", "character 1:", "there is nothing to look for; give"},
+      {"(\xe2\x80\x94) \"!\" -?", "character 1:", "the query has no letters or digits to look for: give"},
       {"a (b", "character 3:", "add a \")\""},
       {"a) b", "character 2:", "remove it"},
       {"é \"b", "character 3:", "add a \""},
@@ -144,8 +150,13 @@ TEST_F(QueryParserTest, RefusalsNameThePlaceAndTheRemedy) {
     EXPECT_NE(refusal.find(row.part), std::string::npos) << refusal;
   }
   std::string many = "w";
-  for (size_t i = 0; i < kQueryMaxTerms; ++i) many += " w";
-  EXPECT_NE(Refusal(many).find("leave some out"), std::string::npos);
+  while (many.size() + 2 <= kQueryMaxBytes) many += " w";
+  EXPECT_EQ(ParseQuery(many, kNow).children.size(), kQueryMaxBytes / 2);
+  for (const char* condition : {" kind:other", " (a b)"}) {
+    many.clear();
+    for (size_t i = 0; i <= kQueryMaxTerms; ++i) many += condition;
+    EXPECT_NE(Refusal(many).find("leave some out"), std::string::npos);
+  }
 }
 
 }  // namespace

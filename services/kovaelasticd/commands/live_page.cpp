@@ -41,12 +41,24 @@ int64_t RoundLimit(int round, int64_t missing, int64_t at) {
   return std::min({missing << (2 * round), kHitsMax, kLastHitMax - at});
 }
 
+/// Lowers the totals by the hits that were dropped, of which `dropped_all` have all words. What was found is counted
+/// anew in each round, and may have become less since.
+void LowerTotals(MergedReply& found, int64_t dropped, int64_t dropped_all) {
+  const auto shown_all =
+      std::count_if(found.hits.begin(), found.hits.end(), [](const IndexHit& shown) { return shown.hit.has_all; });
+  found.total = std::max<int64_t>(found.total - dropped, std::ssize(found.hits));
+  if (!found.total_all.has_value()) return;
+  found.total_all = std::min(std::max<int64_t>(*found.total_all - dropped_all, shown_all), found.total);
+  if (found.total_all == found.total) found.total_all.reset();
+}
+
 }  // namespace
 
 LivePage SearchLivePage(std::vector<AskedIndex>& indices, const SearchRequest& request, const LookFunction& look,
                         const LeaveOutFunction& leave_out) {
   LivePage page{{}, request.offset};
   int64_t dropped = 0;
+  int64_t dropped_all = 0;
   for (int round = 0; round < kRoundsMax; ++round) {
     SearchRequest part = request;
     part.offset = page.next_offset;
@@ -62,12 +74,13 @@ LivePage SearchLivePage(std::vector<AskedIndex>& indices, const SearchRequest& r
         page.found.hits.push_back(std::move(hits[i]));
       } else {
         ++dropped;
+        dropped_all += hits[i].hit.has_all ? 1 : 0;
       }
     }
     const bool ended = std::ssize(hits) < part.limit || page.next_offset >= kLastHitMax;
     if (ended || std::ssize(page.found.hits) >= request.limit) break;
   }
-  page.found.total = std::max<int64_t>(page.found.total - dropped, std::ssize(page.found.hits));
+  LowerTotals(page.found, dropped, dropped_all);
   return page;
 }
 

@@ -46,16 +46,81 @@ void MakeUnique(std::vector<std::string>& words) {
   words.erase(std::unique(words.begin(), words.end()), words.end());
 }
 
-/// Searches one index, and adds its sums to those of all.
-std::vector<IndexHit> SearchOne(const AskedIndex& asked, size_t index, SearchRequest request, MergedReply& merged) {
-  request.asker = asked.asker.has_value() ? &*asked.asker : nullptr;
-  SearchReply reply = asked.open.index->Search(request);
-  merged.total += reply.total;
-  merged.ranking_bounded = merged.ranking_bounded || reply.ranking_bounded;
-  for (std::string& word : reply.suggestions) merged.suggestions.push_back(std::move(word));
+/// The reply of the index at `index` in the list of those that were asked.
+struct IndexReply {
+  size_t index;
+  SearchReply reply;
+};
+
+/// Asks each index by itself. Those that fail are marked, and told to `leave_out`.
+std::vector<IndexReply> AskAll(std::vector<AskedIndex>& indices, SearchRequest request,
+                               const LeaveOutFunction& leave_out) {
+  std::vector<IndexReply> replies;
+  for (size_t i = 0; i < indices.size(); ++i) {
+    AskedIndex& asked = indices[i];
+    if (asked.failed) continue;
+    request.asker = asked.asker.has_value() ? &*asked.asker : nullptr;
+    try {
+      replies.push_back({i, asked.open.index->Search(request)});
+    } catch (const Error& error) {
+      asked.failed = true;
+      leave_out(asked, error);
+    }
+  }
+  return replies;
+}
+
+/// Where one index has documents with all words, the others, asked for the same, have none.
+void DropPoorSubstitutes(std::vector<IndexReply>& replies) {
+  const bool any_has_all = std::any_of(replies.begin(), replies.end(), [](const IndexReply& of) {
+    return of.reply.total > 0 && !of.reply.none_has_all;
+  });
+  for (IndexReply& of : replies) {
+    if (any_has_all && of.reply.none_has_all) of.reply = SearchReply();
+  }
+}
+
+void MergeRepaired(std::vector<RepairedWord>& merged, std::vector<RepairedWord> repaired) {
+  for (RepairedWord& word : repaired) {
+    const auto same = std::find_if(merged.begin(), merged.end(), [&word](const RepairedWord& other) {
+      return other.from == word.from && other.to == word.to;
+    });
+    if (same == merged.end()) {
+      merged.push_back(std::move(word));
+    } else {
+      same->also = same->also || word.also;
+    }
+  }
+}
+
+/// Takes everything but the hits out of the replies.
+MergedReply AddUp(std::vector<IndexReply>& replies) {
+  MergedReply merged;
+  int64_t total_all = 0;
+  bool none_found = true;
+  for (auto& [index, reply] : replies) {
+    merged.total += reply.total;
+    total_all += reply.total_all.value_or(reply.total);
+    merged.ranking_bounded = merged.ranking_bounded || reply.ranking_bounded;
+    merged.none_has_all = merged.none_has_all || reply.none_has_all;
+    std::move(reply.suggestions.begin(), reply.suggestions.end(), std::back_inserter(merged.suggestions));
+    MergeRepaired(merged.repaired, std::move(reply.repaired));
+    if (reply.total == 0) continue;
+    if (none_found) merged.ignored = std::move(reply.ignored);
+    std::erase_if(merged.ignored, [&](const std::string& word) {
+      return !none_found && std::find(reply.ignored.begin(), reply.ignored.end(), word) == reply.ignored.end();
+    });
+    none_found = false;
+  }
+  if (total_all != merged.total) merged.total_all = total_all;
+  MakeUnique(merged.suggestions);
+  return merged;
+}
+
+std::vector<IndexHit> HitsOf(IndexReply& of) {
   std::vector<IndexHit> hits;
-  hits.reserve(reply.hits.size());
-  for (SearchHit& hit : reply.hits) hits.push_back({index, std::move(hit)});
+  hits.reserve(of.reply.hits.size());
+  for (SearchHit& hit : of.reply.hits) hits.push_back({of.index, std::move(hit)});
   return hits;
 }
 
@@ -69,18 +134,11 @@ MergedReply SearchIndices(std::vector<AskedIndex>& indices, const SearchRequest&
     each.offset = 0;
     each.limit = request.offset + request.limit;
   }
-  MergedReply merged;
+  std::vector<IndexReply> replies = AskAll(indices, each, leave_out);
+  DropPoorSubstitutes(replies);
+  MergedReply merged = AddUp(replies);
   std::vector<std::vector<IndexHit>> of_index;
-  for (size_t i = 0; i < indices.size(); ++i) {
-    if (indices[i].failed) continue;
-    try {
-      of_index.push_back(SearchOne(indices[i], i, each, merged));
-    } catch (const Error& error) {
-      indices[i].failed = true;
-      leave_out(indices[i], error);
-    }
-  }
-  MakeUnique(merged.suggestions);
+  for (IndexReply& of : replies) of_index.push_back(HitsOf(of));
   if (!merges) {
     if (!of_index.empty()) merged.hits = std::move(of_index.front());
     return merged;

@@ -26,9 +26,15 @@ struct IndexHit {
   SearchHit hit;
 };
 
+/// The replies of all indices in one; SearchReply says what the members are. An index that has no document with all
+/// words, and shows what has some in their place (none_has_all), counts only where no other index has any.
 struct MergedReply {
   int64_t total = 0;
+  std::optional<int64_t> total_all;  ///< nothing where it is `total`
   bool ranking_bounded = false;
+  bool none_has_all = false;
+  std::vector<std::string> ignored;      ///< words that are passed over in every index where anything was found
+  std::vector<RepairedWord> repaired;    ///< of each index, each once
   std::vector<IndexHit> hits;            ///< the page
   std::vector<std::string> suggestions;  ///< of each index, each once
 };

@@ -11,6 +11,7 @@
 #include "services/kovaelasticd/commands/entered_shares.h"
 #include "services/kovaelasticd/commands/members.h"
 #include "services/kovaelasticd/commands/merged_search.h"
+#include "services/kovaelasticd/commands/search_answer.h"
 #include "services/kovaelasticd/commands/search_request.h"
 #include "services/kovaelasticd/commands/user_search.h"
 #include "services/kovaelasticd/query/query.h"
@@ -106,11 +107,8 @@ AskedIndices OpenAsked(const CommandCall& call) {
 
 /// A hit as the reply has it; takes the fields out of `found`.
 Json::Value HitJson(const AskedIndices& asked, IndexHit& found) {
-  Json::Value hit;
+  Json::Value hit = HitForAll(found.hit);
   hit["id"] = asked.open[found.index].open.id;
-  hit["doc_id"] = found.hit.path;
-  hit["score"] = found.hit.score;
-  if (!found.hit.snippet.empty()) hit["snippet"] = found.hit.snippet;
   hit["fields"] = std::move(found.hit.fields);
   return hit;
 }
@@ -128,13 +126,12 @@ Json::Value SearchEverything(const CommandCall& call, const SearchRequest& reque
                "it is being rebuilt, because " + index.open.rebuild.Reason(), true);
   }
   Json::Value result;
-  result["total"] = Json::Int64(found.total);
+  AddTotalsAndWords(result, found);
   result["ranking_bounded"] = found.ranking_bounded;
   result["next_offset"] = Json::Int64(request.offset + std::ssize(found.hits));
   result["hits"] = Json::Value(Json::arrayValue);
   for (IndexHit& hit : found.hits) result["hits"].append(HitJson(asked, hit));
   result["left_out"] = std::move(asked.left_out);
-  if (found.total == 0 && !found.suggestions.empty()) result["suggestions"] = Vec2JsonArr(found.suggestions);
   const auto took = std::chrono::steady_clock::now() - began;
   result["took_us"] = Json::Int64(std::chrono::duration_cast<std::chrono::microseconds>(took).count());
   return result;

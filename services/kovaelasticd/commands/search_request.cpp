@@ -46,6 +46,8 @@ SearchRequest ReadSearch(const Json::Value& data) {
   request.sort = ReadSort(data);
   request.ascending = ReadAscending(data, request.sort);
   request.snippet = OptionalBool(data, "snippet", true);
+  request.all_words = OptionalBool(data, "all_words", false);
+  request.explain = OptionalBool(data, "explain", false);
   request.mark_start = ReadMark(data, "mark_start", "[");
   request.mark_end = ReadMark(data, "mark_end", "]");
   return request;

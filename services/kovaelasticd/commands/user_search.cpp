@@ -5,8 +5,8 @@
 #include <utility>
 #include <vector>
 
-#include "common/json_util.h"
 #include "services/kovaelasticd/commands/live_page.h"
+#include "services/kovaelasticd/commands/search_answer.h"
 #include "services/kovaelasticd/commands/user_error.h"
 
 namespace ferrox::engine {
@@ -57,11 +57,8 @@ UserScope OpenScope(const CommandCall& call, const Asker& asker) {
 
 /// Takes the fields out of `found`.
 Json::Value UserHitJson(const UserScope& scope, IndexHit& found) {
-  Json::Value hit;
-  hit["doc_id"] = found.hit.path;
+  Json::Value hit = HitForAll(found.hit);
   hit["share"] = scope.indices[found.index].open.share->share;
-  hit["score"] = found.hit.score;
-  if (!found.hit.snippet.empty()) hit["snippet"] = found.hit.snippet;
   hit["fields"] = FieldsForUsers(std::move(found.hit.fields));
   return hit;
 }
@@ -109,14 +106,11 @@ Json::Value SearchForUser(const CommandCall& call, const Asker& asker, const Sea
     AddLeftOutShare(scope, index.open.share->share, Error(Error::kEngineIndexRebuilding), true);
   }
   Json::Value result;
-  result["total"] = Json::Int64(page.found.total);
+  AddTotalsAndWords(result, page.found);
   result["next_offset"] = Json::Int64(page.next_offset);
   result["hits"] = Json::Value(Json::arrayValue);
   for (IndexHit& hit : page.found.hits) result["hits"].append(UserHitJson(scope, hit));
   result["left_out"] = std::move(scope.left_out);
-  if (page.found.total == 0 && !page.found.suggestions.empty()) {
-    result["suggestions"] = Vec2JsonArr(page.found.suggestions);
-  }
   return result;
 }
 

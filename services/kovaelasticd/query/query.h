@@ -36,6 +36,11 @@ struct QueryNode {
   bool phrase = false;
   bool prefix = false;
   bool required = false;  ///< of kText: every hit must have it; else documents without it are found too, further behind
+  /// Of a word that is the first of several neighbouring ones with digits, as "DE89" in "DE89 3704 0044": all of them,
+  /// as they stand in the query. They may be one number or code, which documents have grouped otherwise. The others
+  /// follow as the next children of the same node; with this one they are `joined_words`.
+  std::string joined;
+  size_t joined_words = 0;
   std::vector<std::string> fields;
   std::vector<int32_t> kinds;
   int64_t low = std::numeric_limits<int64_t>::min();
@@ -44,7 +49,7 @@ struct QueryNode {
 
 /// The longest query, in bytes.
 constexpr size_t kQueryMaxBytes = 4096;
-/// The most conditions and the deepest parentheses in one.
+/// The most conditions in one, apart from plain words, and the deepest parentheses. A group in parentheses is one, too.
 constexpr size_t kQueryMaxTerms = 64;
 constexpr size_t kQueryMaxDepth = 16;
 
@@ -52,7 +57,8 @@ constexpr size_t kQueryMaxDepth = 16;
 /// @throws Error kEngineBadRequest with a sentence that names the place, counted in characters from 1, and the remedy.
 QueryNode ParseQuery(std::string_view text, int64_t now);
 
-/// The query in one canonical line, for tests: "(and word (not name:x))".
+/// The query in one canonical line, for tests: "(and word +required (not name:x))"; of `joined` the words in
+/// square brackets.
 std::string PrintQuery(const QueryNode& query);
 
 }  // namespace ferrox::engine

@@ -2,6 +2,7 @@
 #include <string_view>
 #include <utility>
 
+#include "services/kovaelasticd/query/number_run.h"
 #include "services/kovaelasticd/query/query.h"
 #include "services/kovaelasticd/query/query_conditions.h"
 
@@ -15,15 +16,22 @@ bool IsNameChar(char c) {
   return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z') || (c >= '0' && c <= '9') || c == '_';
 }
 
+/// Every hit must have each of these words.
+void Require(QueryNode& node) {
+  node.required = node.type == QueryNode::Type::kText;
+  for (QueryNode& child : node.children) Require(child);
+}
+
 /// Reads the grammar, by recursive descent; a ConditionReader reads the single conditions.
 ///
 ///   or        = and { "OR" and }
 ///   and       = [ unary { [ "AND" ] unary } ]
-///   unary     = ( "-" | "NOT" ) unary | primary
+///   unary     = ( "-" | "NOT" | "+" ) unary | primary
 ///   primary   = "(" or ")" | [ name ":" ] value
 ///   value     = "\"" text "\"" [ "*" ] | word
 ///
 /// A value without letters and digits asks for nothing: its node is kAll, and is left out of what it is joined with.
+/// Words are required behind "+", in quotes, within parentheses, beside OR, and all of them where there is an AND.
 class Parser {
  public:
   Parser(std::string_view text, int64_t now) : text_(text), conditions_(text, now) {}
@@ -36,8 +44,13 @@ class Parser {
     QueryNode query = ParseOr();
     SkipBlanks();
     if (pos_ < text_.size()) conditions_.Refuse(pos_, "this \")\" closes nothing; remove it or open it before");
-    if (terms_ == 0)
-      conditions_.Refuse(0, "there is nothing to look for; give a word, or a condition such as kind:image");
+    if (!asks_) {
+      const bool blank = text_.find_first_not_of(" \t\n\v\f\r") == std::string_view::npos;
+      conditions_.Refuse(0, std::string(blank ? "there is nothing to look for; "
+                                              : "the query has no letters or digits to look for: ") +
+                                "give a word, or a condition such as kind:image");
+    }
+    if (has_and_) Require(query);
     return query;
   }
 
@@ -76,13 +89,17 @@ class Parser {
       QueryNode only = std::move(child.children.front());
       child = std::move(only);
     }
-    if (either.children.size() > 1) return either;
+    if (either.children.size() > 1) {
+      Require(either);
+      return either;
+    }
     QueryNode only = std::move(either.children.front());
     return only;
   }
 
   QueryNode ParseAnd() {
     QueryNode all(QueryNode::Type::kAnd);
+    NumberRun run(text_);
     while (!AtEnd()) {
       const size_t begin = pos_;
       if (TakeKeyword("OR")) {
@@ -91,19 +108,35 @@ class Parser {
       }
       if (TakeKeyword("AND")) {
         if (all.children.empty() || AtEnd()) conditions_.Refuse(begin, "AND needs a condition on both sides; add one");
+        has_and_ = true;
+        run.End();
         continue;
       }
       QueryNode node = ParseUnary();
-      if (node.type != QueryNode::Type::kAll) all.children.push_back(std::move(node));
+      if (node.type == QueryNode::Type::kAll) continue;
+      all.children.push_back(std::move(node));
+      run.Add(all.children, begin, pos_);
     }
     return all;
+  }
+
+  /// Whether `sign` is at hand, and before something: signs alone, such as "-" and "--", are words without letters.
+  bool IsSign(char sign) const {
+    if (text_[pos_] != sign) return false;
+    const size_t behind = text_.find_first_not_of("+-", pos_);
+    return behind != std::string_view::npos && !IsBlank(text_[behind]) && text_[behind] != ')';
   }
 
   QueryNode ParseUnary() {
     SkipBlanks();
     const size_t begin = pos_;
-    const bool minus = text_[pos_] == '-' && pos_ + 1 < text_.size() && !IsBlank(text_[pos_ + 1]);
-    if (minus) {
+    if (IsSign('+')) {
+      pos_ = text_.find_first_not_of('+', pos_);
+      QueryNode node = ParseUnary();
+      Require(node);
+      return node;
+    }
+    if (IsSign('-')) {
       ++pos_;
     } else if (!TakeKeyword("NOT")) {
       return ParsePrimary();
@@ -133,8 +166,10 @@ class Parser {
       if (pos_ >= text_.size()) conditions_.Refuse(begin, "this \"(\" is not closed; add a \")\"");
       ++pos_;
       --depth_;
-      const bool empty = inner.type == QueryNode::Type::kAnd && inner.children.empty();
-      return empty ? QueryNode(QueryNode::Type::kAll) : inner;
+      if (inner.type == QueryNode::Type::kAnd && inner.children.empty()) return QueryNode(QueryNode::Type::kAll);
+      Require(inner);
+      if (!inner.children.empty()) Count(inner, begin);
+      return inner;
     }
     std::string name;
     size_t end = pos_;
@@ -148,11 +183,19 @@ class Parser {
       conditions_.Refuse(begin, "\"" + name + ":\" needs a value behind it; add one");
     QueryNode node =
         name.empty() ? conditions_.Words(QueryNode::Type::kText, value) : conditions_.Field(name, begin, value);
-    if (node.type != QueryNode::Type::kAll && ++terms_ > kQueryMaxTerms) {
+    if (value.phrase) Require(node);
+    Count(node, begin);
+    return node;
+  }
+
+  /// Plain words are as many as fit into the query.
+  void Count(const QueryNode& node, size_t begin) {
+    if (node.type == QueryNode::Type::kAll) return;
+    asks_ = true;
+    if (node.type != QueryNode::Type::kText && ++terms_ > kQueryMaxTerms) {
       conditions_.Refuse(begin,
                          "there are more than " + std::to_string(kQueryMaxTerms) + " conditions; leave some out");
     }
-    return node;
   }
 
   ConditionValue ParseValue() {
@@ -182,9 +225,11 @@ class Parser {
 
   const std::string_view text_;
   const ConditionReader conditions_;
-  size_t pos_ = 0;    ///< what is to be read next
-  size_t depth_ = 0;  ///< of the parentheses and NOTs that are open
-  size_t terms_ = 0;  ///< conditions so far
+  size_t pos_ = 0;        ///< what is to be read next
+  size_t depth_ = 0;      ///< of the parentheses and NOTs that are open
+  size_t terms_ = 0;      ///< conditions so far, apart from plain words
+  bool asks_ = false;     ///< there was a word or a condition
+  bool has_and_ = false;  ///< "AND" was written
 };
 
 }  // namespace

@@ -16,7 +16,9 @@ void PrintJoined(std::string& out, const QueryNode& node) {
 }
 
 void PrintWords(std::string& out, const std::string& before, const QueryNode& node) {
-  out += before + (node.phrase ? "\"" + node.text + "\"" : node.text) + (node.prefix ? "*" : "");
+  if (!node.joined.empty()) out += '[' + node.joined + "] ";
+  out += (node.required ? "+" : "") + before + (node.phrase ? "\"" + node.text + "\"" : node.text) +
+         (node.prefix ? "*" : "");
 }
 
 std::string Join(const std::vector<std::string>& parts) {

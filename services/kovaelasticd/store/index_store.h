@@ -104,6 +104,7 @@ struct SearchHit {
   std::string stamp = {};  ///< "_KOVAStamp"; "": it has none
   bool is_folder = false;
   std::string title = {};                   ///< of its text; "": it has none
+  bool has_all = true;                      ///< it counts in SearchReply::total_all
   std::vector<ScorePart> explanation = {};  ///< when it was asked for, what adds most first
 };
 

@@ -1,0 +1,17 @@
+#pragma once
+
+#include <json/value.h>
+
+#include "services/kovaelasticd/commands/merged_search.h"
+
+namespace ferrox::engine {
+
+/// Sets the members of the reply to a search that tell how its words were taken: "total", "total_all", "ignored",
+/// "repaired", "none_has_all", "suggestions". Who asks makes no difference: all of them follow from the documents that
+/// were searched for the asker.
+void AddTotalsAndWords(Json::Value& result, const MergedReply& found);
+
+/// The members of a hit that are the same for everyone: "doc_id", "score", "snippet", "title", "explain".
+Json::Value HitForAll(const SearchHit& found);
+
+}  // namespace ferrox::engine
