@@ -2,6 +2,7 @@
 
 #include <algorithm>
 
+#include "services/kovaelasticd/text/clean.h"
 #include "services/kovaelasticd/text/words.h"
 
 namespace ferrox::engine {
@@ -19,7 +20,6 @@ constexpr size_t kWindowBytes = 180;   ///< from the first to the last word that
 constexpr size_t kLeadBytes = 60;      ///< shown before the first word
 constexpr size_t kSnippetBytes = 240;  ///< in all, without the marks
 constexpr char kEllipsis[] = "\xE2\x80\xA6";
-constexpr char kReplacement[] = "\xEF\xBF\xBD";
 
 /// A word of the query in the text, by bytes.
 struct Match {
@@ -88,26 +88,6 @@ size_t WordStart(std::string_view text, size_t pos, size_t limit) {
   if (blank != std::string_view::npos && blank + 1 <= limit && blank < pos + kLeadBytes / 2) return blank + 1;
   while (pos < limit && IsContinuationByte(text[pos])) ++pos;
   return pos;
-}
-
-/// Appends text safe to print, with every run of blanks and control characters as one blank. Marks that turn the
-/// direction of writing count as control characters: they would turn what is printed behind the snippet.
-void AppendClean(std::string& out, std::string_view text) {
-  for (size_t pos = 0; pos < text.size();) {
-    const CodePoint c = DecodeAt(text, pos);
-    const std::string_view bytes = text.substr(pos, c.length_bytes);
-    pos += c.length_bytes;
-    const bool control = c.value < 0x21 || (c.value >= 0x7F && c.value <= 0x9F && c.length_bytes == 2) ||
-                         c.value == 0x7F || (c.value >= 0x202A && c.value <= 0x202E) ||
-                         (c.value >= 0x2066 && c.value <= 0x2069);
-    if (control) {
-      if (!out.empty() && out.back() != ' ') out += ' ';
-    } else if (c.value >= 0x80 && c.length_bytes == 1) {
-      out += kReplacement;
-    } else {
-      out += bytes;
-    }
-  }
 }
 
 }  // namespace
