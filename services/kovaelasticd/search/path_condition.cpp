@@ -42,7 +42,7 @@ DocSet PathCondition::AllDocuments() {
   const size_t most = places == nullptr ? kFoldersListedMax : places->Documents().End() / kPlacesForAFolder + 1;
   if (const auto folders = FewFolders(most); folders.has_value()) return DocumentsIn(*folders);
   if (places == nullptr) places = reader_.places.Load(reader_.database, version_);
-  FoldersBelow below(*places, folder_);
+  FoldersBelow below(*places, {folder_});
   DocSet found;
   const auto end = static_cast<int64_t>(places->Documents().End());
   for (int64_t id = 0; id < end; ++id) {
@@ -65,7 +65,7 @@ void PathCondition::Apply(DocSet& documents, bool wanted) {
     if (const auto folders = FewFolders(kFoldersListedMax); folders.has_value()) return combine(DocumentsIn(*folders));
   }
   const std::shared_ptr<const Places> places = reader_.places.Load(reader_.database, version_);
-  FoldersBelow below(*places, folder_);
+  FoldersBelow below(*places, {folder_});
   keep([&](int64_t id) { return below.Contains(places->Documents().At(static_cast<size_t>(id)).folder); });
 }
 

@@ -10,6 +10,7 @@
 #include "common/file_util.h"
 #include "fileindex/util.h"
 #include "services/kovaelasticd/store/packed_fields.h"
+#include "services/kovaelasticd/text/stems.h"
 #include "services/kovaelasticd/text/words.h"
 
 namespace ferrox::engine {
@@ -87,6 +88,16 @@ void AppendFieldWords(std::string& out, const std::string& name, const Json::Val
     out += scanner.Word();
     out += kReadyEnd;
   }
+}
+
+/// Appends the words of a folder's name, as AppendFieldWords does, and what else they are looked for as.
+void AppendFolderNameWords(std::string& out, std::string_view folder_name) {
+  std::vector<std::string> words;
+  for (WordScanner scanner(folder_name); scanner.Next();) words.emplace_back(scanner.Word());
+  for (size_t i = 0, plain = words.size(); i < plain; ++i) {
+    for (std::string& stem : QueryStems(words[i])) words.push_back(std::move(stem));
+  }
+  for (const std::string& word : words) (((out += kFolderNameField) += kFieldEnd) += word) += kReadyEnd;
 }
 
 /// A number of 0 or more, rounded; nothing for what is none. Readers give some numbers as texts.
@@ -204,6 +215,7 @@ MetaText MakeMetaText(const DocRow& row, const Json::Value& document, const Sche
     if (Schema::IsSearchable(name)) AppendFieldWords(meta.fields, name, *member);
     if (Schema::IsRanged(name)) AppendRangeWord(meta.fields, name, *member);
   }
+  if (row.kind == kFolder) AppendFolderNameWords(meta.fields, Basename(row.path));
   return meta;
 }
 

@@ -62,6 +62,9 @@ inline constexpr char kReadyMark = '\x03';
 inline constexpr char kReadyEnd = '\x1E';
 /// Stands between a field's name and the word, in a word marked with its field.
 inline constexpr char kFieldEnd = '\x1F';
+/// Stands for a field's name before the words of a folder's own name, by which what lies in it is found; the stems that
+/// these words have in any language follow them.
+inline constexpr char kFolderNameField[] = "/";
 /// The word by which a number in a field is found; words of one field have the order of their numbers.
 std::string RangeWord(const std::string& field_name, int64_t number);
 

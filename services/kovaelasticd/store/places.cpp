@@ -135,10 +135,12 @@ std::shared_ptr<const Places> Places::Load(Database& database, int64_t version, 
   return places;
 }
 
-FoldersBelow::FoldersBelow(const Places& places, int64_t top)
+FoldersBelow::FoldersBelow(const Places& places, const std::vector<int64_t>& tops)
     : folders_(places.Folders()), known_(folders_.End(), Known::kNo) {
   if (known_.empty()) return;
-  if (static_cast<uint64_t>(top) < known_.size()) known_[static_cast<size_t>(top)] = Known::kInside;
+  for (const int64_t top : tops) {
+    if (static_cast<uint64_t>(top) < known_.size()) known_[static_cast<size_t>(top)] = Known::kInside;
+  }
   known_[0] = Known::kOutside;
 }
 

@@ -26,6 +26,8 @@ static_assert(sizeof(Place) == 8);
 
 /// What stands for a name in PathKeys, and in the table "locations": FNV-1a of its bytes.
 uint32_t NameHash(std::string_view name);
+/// The same for the name of a folder, which ends with "/", made from that of its own document, which does not.
+constexpr uint32_t FolderNameHash(uint32_t document_name) { return (document_name ^ uint32_t{'/'}) * 16777619U; }
 
 /// Places by the number of their document or folder, in parts that copies share: a copy with a few other places costs
 /// little.
@@ -114,13 +116,13 @@ class PathKeys {
   const std::vector<uint64_t>& folder_keys_;
 };
 
-/// The folders at and below one. Whether a folder is among them is found by the way up from it, once for each folder on
-/// that way: so a search of many documents costs little more than one step for each, in whatever order folders were
+/// The folders at and below some. Whether a folder is among them is found by the way up from it, once for each folder
+/// on that way: so a search of many documents costs little more than one step for each, in whatever order folders were
 /// made and moved. What does not hang on the tree is below nothing.
 class FoldersBelow {
  public:
   /// `places` must outlive this. Below FolderTree::kNone is nothing.
-  FoldersBelow(const Places& places, int64_t top);
+  FoldersBelow(const Places& places, const std::vector<int64_t>& tops);
   bool Contains(uint32_t folder);
 
  private:

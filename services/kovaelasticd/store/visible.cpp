@@ -5,10 +5,10 @@
 namespace ferrox::engine {
 
 Visible::Visible(StoreReader& reader, const Asker* asker)
-    : reader_(reader), for_asker_(asker != nullptr), hidden_(reader.hidden.get()) {
+    : reader_(reader), asker_(asker), hidden_(reader.hidden.get()) {
   const Totals totals = LoadTotals(reader.database);
   version_ = totals.version;
-  if (!for_asker_) {
+  if (asker == nullptr) {
     documents_ = totals.documents;
     with_content_ = totals.with_content;
     text_bytes_ = totals.text_bytes;
@@ -23,7 +23,7 @@ Visible::Visible(StoreReader& reader, const Asker* asker)
 }
 
 void Visible::Trim(DocSet& documents) const {
-  if (for_asker_) {
+  if (IsForAsker()) {
     documents.IntersectWith(readable_ != nullptr ? readable_->Documents() : DocSet());
   } else if (hidden_ != nullptr) {
     documents.Subtract(*hidden_);
@@ -31,7 +31,7 @@ void Visible::Trim(DocSet& documents) const {
 }
 
 DocSet Visible::All() const {
-  if (for_asker_) return readable_ != nullptr ? readable_->Documents() : DocSet();
+  if (IsForAsker()) return readable_ != nullptr ? readable_->Documents() : DocSet();
   DocSet all;
   Statement rows = reader_.database.Prepare("SELECT id FROM docs");
   while (rows.Step()) all.Add(rows.Int(0));

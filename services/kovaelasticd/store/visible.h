@@ -19,12 +19,12 @@ struct StoreReader;
 /// that nothing else tells of other documents. For one snapshot and one thread.
 class Visible {
  public:
-  /// `reader`, which must outlive this, has a transaction open. `asker`: null for who may see everything.
+  /// `reader`, which must outlive this as `asker` must, has a transaction open. Null: for who may see everything.
   /// @throws Error kEngineStorage.
   Visible(StoreReader& reader, const Asker* asker);
 
   bool Contains(int64_t id) const {
-    if (for_asker_) return readable_ != nullptr && readable_->Documents().Contains(id);
+    if (IsForAsker()) return readable_ != nullptr && readable_->Documents().Contains(id);
     return hidden_ == nullptr || !hidden_->Contains(id);
   }
   /// Removes what is not visible.
@@ -39,7 +39,9 @@ class Visible {
 
   /// Whether an ordinary user asks: then no number of a document may decide what they see, since numbers tell of other
   /// documents. PathKey decides in their place.
-  bool IsForAsker() const { return for_asker_; }
+  bool IsForAsker() const { return asker_ != nullptr; }
+  /// The folder that is the share's root, for an asker only: it may end with "/".
+  const std::string& ShareRoot() const { return asker_->share_root; }
   /// PathKeys; for an asker only.
   uint64_t PathKey(int64_t id) const {
     if (places_ == nullptr) return 0;
@@ -49,7 +51,7 @@ class Visible {
 
  private:
   StoreReader& reader_;
-  const bool for_asker_;
+  const Asker* const asker_;
   const DocSet* const hidden_;
   std::shared_ptr<const Places> places_;
   std::shared_ptr<const ReadableDocuments> readable_;  ///< null for an asker: nothing is readable
