@@ -79,6 +79,11 @@ std::string FolderTree::PathOf(int64_t folder) {
   return "/" + std::string(reversed.rbegin(), reversed.rend());
 }
 
+std::pair<int64_t, std::string> FolderTree::PlaceOf(int64_t folder) {
+  Node node = NodeOf(folder);
+  return {node.parent, std::move(node.name)};
+}
+
 std::vector<int64_t> FolderTree::AtAndBelow(int64_t folder) {
   return *AtAndBelow(folder, std::numeric_limits<size_t>::max());
 }

@@ -45,6 +45,8 @@ class FolderTree {
   int64_t Make(std::string_view folder_path);
   /// With "/" at its end; "" for a folder that was taken out, or is below such a one.
   std::string PathOf(int64_t folder);
+  /// The folder above, and the folder's own name with "/" at its end.
+  std::pair<int64_t, std::string> PlaceOf(int64_t folder);
   /// The folder and all below it, each before those in it.
   std::vector<int64_t> AtAndBelow(int64_t folder);
   /// The same; nothing when there are more than `most`.
