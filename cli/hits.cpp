@@ -145,6 +145,9 @@ int PrintFound(const Arguments& arguments, Found found) {
     PrintNothingFound(result, found.left_out.Empty());
   }
   (void)fflush(stdout);
+  for (const Json::Value& hint : result["hints"]) {
+    if (hint.isString()) Warn(EscapeOneLine(hint.asString()));
+  }
   if (!found.not_noticed.empty()) Warn(found.not_noticed);
   found.left_out.Warn();
   const bool partial = arguments.Has("--partial");

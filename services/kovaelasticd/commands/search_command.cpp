@@ -141,10 +141,13 @@ Json::Value SearchEverything(const CommandCall& call, const SearchRequest& reque
 
 Json::Value RunSearch(CommandCall& call) {
   SearchRequest request = ReadSearch(call.data);
-  const QueryNode query = ParseQuery(RequiredText(call.data, "query"), Clock::Get().Now());
+  std::vector<std::string> hints;
+  const QueryNode query = ParseQuery(RequiredText(call.data, "query"), Clock::Get().Now(), &hints);
   request.query = &query;
   const std::optional<Asker> asker = AskerOf(call.caller, call.data, call.named);
-  return asker.has_value() ? SearchForUser(call, *asker, request) : SearchEverything(call, request);
+  Json::Value result = asker.has_value() ? SearchForUser(call, *asker, request) : SearchEverything(call, request);
+  if (!hints.empty()) result["hints"] = Vec2JsonArr(hints);
+  return result;
 }
 
 }  // namespace ferrox::engine

@@ -54,8 +54,9 @@ constexpr size_t kQueryMaxTerms = 64;
 constexpr size_t kQueryMaxDepth = 16;
 
 /// Reads a query. Dates are taken in local time; `now` (seconds since the epoch) is what relative ones count from.
+/// `hints`, unless null, gets sentences about what was read otherwise than it may be meant.
 /// @throws Error kEngineBadRequest with a sentence that names the place, counted in characters from 1, and the remedy.
-QueryNode ParseQuery(std::string_view text, int64_t now);
+QueryNode ParseQuery(std::string_view text, int64_t now, std::vector<std::string>* hints = nullptr);
 
 /// The query in one canonical line, for tests: "(and word +required (not name:x))"; of `joined` the words in
 /// square brackets.

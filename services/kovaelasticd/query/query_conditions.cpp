@@ -2,9 +2,13 @@
 
 #include <algorithm>
 #include <optional>
+#include <sstream>
+#include <utility>
 
 #include "base/text.h"
 #include "common/error.h"
+#include "services/kovaelasticd/query/field_names.h"
+#include "services/kovaelasticd/query/kinds.h"
 #include "services/kovaelasticd/query/query_values.h"
 #include "services/kovaelasticd/text/schema.h"
 #include "services/kovaelasticd/text/words.h"
@@ -14,11 +18,43 @@ namespace ferrox::engine {
 
 namespace {
 
+constexpr size_t kHintsMax = 3;
+
 QueryNode RangeNode(QueryNode::Type type, const ValueRange& range) {
   QueryNode node(type);
   node.low = range.low;
   node.high = range.high;
   return node;
+}
+
+/// `either`, or its only child.
+QueryNode OnlyOr(QueryNode either) {
+  if (either.children.size() > 1) return either;
+  QueryNode only = std::move(either.children.front());
+  return only;
+}
+
+bool IsAsciiAlnum(char c) {
+  const char lower = base::LowerAscii(c);
+  return (lower >= 'a' && lower <= 'z') || (c >= '0' && c <= '9');
+}
+
+/// Of a single word with "*" or "?" within it what stands before the first of them; "" for anything else.
+std::string_view BeforeWildcard(std::string_view word) {
+  word = word.substr(0, word.find_last_not_of("*?") + 1);  // those of "what??" are punctuation
+  const size_t at = word.find_first_of("*?");
+  if (at == std::string_view::npos || (word.front() >= '0' && word.front() <= '9')) return {};
+  const bool plain = std::all_of(word.begin(), word.end(),
+                                 [](char c) { return IsAsciiAlnum(c) || c == '*' || c == '?' || (c & 0x80) != 0; });
+  return plain ? word.substr(0, at) : std::string_view();
+}
+
+/// The extension in "*.pdf"; "" for anything else.
+std::string_view ExtensionAsked(const ConditionValue& value) {
+  const std::string_view text = value.text;
+  const bool is_one = !value.phrase && !value.prefix && text.size() > 2 && text.starts_with("*.") &&
+                      std::all_of(text.begin() + 2, text.end(), &IsAsciiAlnum);
+  return is_one ? text.substr(2) : std::string_view();
 }
 
 }  // namespace
@@ -29,11 +65,42 @@ void ConditionReader::Refuse(size_t at, const std::string& sentence) const {
   throw Error(Error::kEngineBadRequest, "query, character " + std::to_string(character) + ": " + sentence);
 }
 
-/// A node for words; one that asks for nothing when there is no letter or digit in them.
-QueryNode ConditionReader::Words(QueryNode::Type type, const ConditionValue& value) const {
-  if (!value.phrase && value.text.size() > 1 && value.text.front() == '*') {
-    Refuse(value.begin, "a \"*\" can stand only at the end of a word; name:port finds it inside names too");
+void ConditionReader::Hint(const std::string& sentence) const {
+  if (hints_ == nullptr || hints_->size() == kHintsMax ||
+      std::find(hints_->begin(), hints_->end(), sentence) != hints_->end())
+    return;
+  hints_->push_back(sentence);
+}
+
+/// The index knows words by their beginnings, and names by any part of them: of "rep*t" the beginning is looked for.
+ConditionValue ConditionReader::WithoutWildcards(QueryNode::Type type, ConditionValue value) const {
+  const size_t begin = value.text.find_first_not_of('*');
+  if (begin == std::string::npos) {
+    value.text.clear();
+  } else if (begin > 0) {
+    value.text.erase(0, begin);
+    const bool needless = type == QueryNode::Type::kName || !IsAsciiAlnum(value.text.front());
+    if (!needless) {
+      Hint("a \"*\" can stand only at the end of a word; names are found by any part of them: name:" + value.text);
+    }
   }
+  const std::string before(BeforeWildcard(value.text));
+  if (before.size() < 2) return value;
+  Hint("a \"*\" or \"?\" within a word is not known; what is looked for begins with " + before);
+  value.text = before;
+  value.prefix = true;
+  return value;
+}
+
+/// A node for words; one that asks for nothing when there is no letter or digit in them.
+QueryNode ConditionReader::Words(QueryNode::Type type, const ConditionValue& given) const {
+  const std::string extension(ExtensionAsked(given));
+  if (type == QueryNode::Type::kText && !extension.empty()) {
+    QueryNode node(QueryNode::Type::kExt);
+    node.text = base::LowerAscii(extension);
+    return node;
+  }
+  const ConditionValue value = given.phrase ? given : WithoutWildcards(type, given);
   const QueryWords words = SplitQueryText(value.text, value.prefix);
   if (words.words.empty()) return QueryNode(QueryNode::Type::kAll);
   if (value.prefix && words.words.back().size() < 2) {
@@ -47,26 +114,28 @@ QueryNode ConditionReader::Words(QueryNode::Type type, const ConditionValue& val
 }
 
 QueryNode ConditionReader::Field(const std::string& name, size_t begin, const ConditionValue& value) const {
-  const std::string lower = base::LowerAscii(name);
-  if (lower == "kind") return Kinds(value);
-  if (lower == "ext" || name == field::kExtension) return Extensions(value);
-  if (lower == "path") return Path(value);
-  if (lower == "size") return Size(value);
-  if (lower == "date") return Date(value);
-  if (const RangeField* field = FindRangeField(lower)) return Number(*field, value);
-  const bool is_name =
-      lower == "name" || name == field::kFsName || name == field::kSearchName || name == field::kDisplayName;
-  if (is_name) return Name(value);
-  return WordsInField(name, begin, value);
+  switch (ConditionTypeOf(name)) {
+    case ConditionType::kName:
+      return Words(QueryNode::Type::kName, value);
+    case ConditionType::kKind:
+      return Kinds(value);
+    case ConditionType::kExt:
+      return Extensions(value);
+    case ConditionType::kPath:
+      return Path(value);
+    case ConditionType::kSize:
+      return Size(value);
+    case ConditionType::kDate:
+      return Date(value);
+    case ConditionType::kNone:
+      break;
+  }
+  const RangeField* range = FindRangeField(name);
+  return range != nullptr ? Number(*range, value) : WordsInField(name, begin, value);
 }
 
 QueryNode ConditionReader::WordsInField(const std::string& name, size_t begin, const ConditionValue& value) const {
   std::vector<std::string> fields = FriendlyFields(name);
-  const bool full_name = name.compare(0, 4, "KOVA") == 0 || name.compare(0, 7, "_KOVAMD") == 0;
-  if (fields.empty() && !full_name) {
-    Refuse(begin, "there is no field \"" + name + "\"; known are " + KnownFields() +
-                      "; to look for the text as it stands, put it in quotes");
-  }
   if (fields.empty() && name != field::kTextContent && !Schema::IsSearchable(name)) {
     Refuse(begin, "field \"" + name + "\" cannot be searched by words; use path:, size:, date:, kind: or ext:");
   }
@@ -93,22 +162,24 @@ std::string ConditionReader::GroupNumber(const ConditionValue& value) const {
   return std::to_string(*number);
 }
 
-QueryNode ConditionReader::Name(ConditionValue value) const {
-  if (!value.phrase && value.text.size() > 1 && value.text.front() == '*') value.text.erase(0, 1);
-  return Words(QueryNode::Type::kName, value);
-}
-
 QueryNode ConditionReader::Kinds(const ConditionValue& value) const {
-  QueryNode node(QueryNode::Type::kKind);
+  QueryNode kinds(QueryNode::Type::kKind);
+  QueryNode either(QueryNode::Type::kOr);
   for (const std::string& part : Parts(value)) {
-    const std::optional<int32_t> kind = ParseKind(part);
-    if (!kind.has_value()) {
-      Refuse(value.begin,
-             "there is no kind \"" + part + "\"; known are document, audio, video, image, folder and other");
+    const std::optional<NamedKind> kind = FindKind(part);
+    if (!kind.has_value()) Refuse(value.begin, "there is no kind \"" + part + "\"; known are " + kKnownKinds);
+    if (kind->kind.has_value()) {
+      kinds.kinds.push_back(*kind->kind);
+      continue;
     }
-    node.kinds.push_back(*kind);
+    std::istringstream extensions{std::string(kind->extensions)};
+    for (std::string extension; extensions >> extension;) {
+      either.children.emplace_back(QueryNode::Type::kExt).text = extension;
+    }
   }
-  return node;
+  if (either.children.empty()) return kinds;
+  if (!kinds.kinds.empty()) either.children.push_back(std::move(kinds));
+  return OnlyOr(std::move(either));
 }
 
 QueryNode ConditionReader::Extensions(const ConditionValue& value) const {
@@ -118,9 +189,7 @@ QueryNode ConditionReader::Extensions(const ConditionValue& value) const {
     node.text = base::LowerAscii(part.front() == '.' ? part.substr(1) : part);
     either.children.push_back(std::move(node));
   }
-  if (either.children.size() > 1) return either;
-  QueryNode only = std::move(either.children.front());
-  return only;
+  return OnlyOr(std::move(either));
 }
 
 /// The parts of "a,b,c".
@@ -140,7 +209,7 @@ std::vector<std::string> ConditionReader::Parts(const ConditionValue& value) con
 
 QueryNode ConditionReader::Path(const ConditionValue& value) const {
   if (value.text.front() != '/') {
-    Refuse(value.begin, "path: takes the full path of a folder, such as path:/volume1/photo; begin it with /");
+    Refuse(value.begin, "a folder is given by its full path, such as path:/volume1/photo; begin it with /");
   }
   QueryNode node(QueryNode::Type::kPath);
   node.text = value.text;

@@ -23,10 +23,12 @@ struct ConditionValue {
 class ConditionReader {
  public:
   /// `query` is the whole query; it must outlive this. `now`: what relative dates count from, in seconds since the
-  /// epoch.
-  ConditionReader(std::string_view query, int64_t now) : query_(query), now_(now) {}
+  /// epoch. `hints` gets sentences about what was read otherwise than it may be meant; null: none.
+  ConditionReader(std::string_view query, int64_t now, std::vector<std::string>* hints)
+      : query_(query), now_(now), hints_(hints) {}
 
-  /// Words anywhere (kText) or in the name (kName); kAll when the value has neither letter nor digit.
+  /// Words anywhere (kText), for which "*.pdf" is an extension, or in the name (kName); kAll when the value has neither
+  /// letter nor digit.
   /// @throws Error kEngineBadRequest, as Field does.
   QueryNode Words(QueryNode::Type type, const ConditionValue& value) const;
   /// The condition "name:value", which begins at `begin`; the value is not empty.
@@ -34,12 +36,14 @@ class ConditionReader {
   /// Throws Error kEngineBadRequest: "query, character N: sentence"; N is the place of the byte `at`, counted in
   /// characters from 1.
   [[noreturn]] void Refuse(size_t at, const std::string& sentence) const;
+  /// Each sentence once.
+  void Hint(const std::string& sentence) const;
 
  private:
+  ConditionValue WithoutWildcards(QueryNode::Type type, ConditionValue value) const;
   QueryNode WordsInField(const std::string& name, size_t begin, const ConditionValue& value) const;
   std::string UserNumber(const ConditionValue& value) const;
   std::string GroupNumber(const ConditionValue& value) const;
-  QueryNode Name(ConditionValue value) const;
   QueryNode Kinds(const ConditionValue& value) const;
   QueryNode Extensions(const ConditionValue& value) const;
   QueryNode Path(const ConditionValue& value) const;
@@ -50,6 +54,7 @@ class ConditionReader {
 
   const std::string_view query_;
   const int64_t now_;
+  std::vector<std::string>* const hints_;
 };
 
 }  // namespace ferrox::engine

@@ -10,12 +10,6 @@ namespace ferrox::engine {
 
 namespace {
 
-bool IsBlank(char c) { return c == ' ' || (c >= '\t' && c <= '\r'); }
-
-bool IsNameChar(char c) {
-  return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z') || (c >= '0' && c <= '9') || c == '_';
-}
-
 /// Every hit must have each of these words.
 void Require(QueryNode& node) {
   node.required = node.type == QueryNode::Type::kText;
@@ -24,17 +18,18 @@ void Require(QueryNode& node) {
 
 /// Reads the grammar, by recursive descent; a ConditionReader reads the single conditions.
 ///
-///   or        = and { "OR" and }
+///   or        = and { ( "OR" | "|" ) and }
 ///   and       = [ unary { [ "AND" ] unary } ]
 ///   unary     = ( "-" | "NOT" | "+" ) unary | primary
-///   primary   = "(" or ")" | [ name ":" ] value
-///   value     = "\"" text "\"" [ "*" ] | word
+///   primary   = "(" or ")" | [ field ] value             field: see FieldAt
+///   value     = "\"" text "\"" [ "*" ] | word             see ReadQueryValue
 ///
 /// A value without letters and digits asks for nothing: its node is kAll, and is left out of what it is joined with.
 /// Words are required behind "+", in quotes, within parentheses, beside OR, and all of them where there is an AND.
 class Parser {
  public:
-  Parser(std::string_view text, int64_t now) : text_(text), conditions_(text, now) {}
+  Parser(std::string_view text, int64_t now, std::vector<std::string>* hints)
+      : text_(text), conditions_(text, now, hints) {}
 
   QueryNode Parse() {
     if (text_.size() > kQueryMaxBytes) {
@@ -42,8 +37,6 @@ class Parser {
     }
     if (text_.find('\0') != std::string_view::npos) conditions_.Refuse(0, "the query holds a NUL byte; leave it out");
     QueryNode query = ParseOr();
-    SkipBlanks();
-    if (pos_ < text_.size()) conditions_.Refuse(pos_, "this \")\" closes nothing; remove it or open it before");
     if (!asks_) {
       const bool blank = text_.find_first_not_of(" \t\n\v\f\r") == std::string_view::npos;
       conditions_.Refuse(0, std::string(blank ? "there is nothing to look for; "
@@ -56,34 +49,51 @@ class Parser {
 
  private:
   void SkipBlanks() {
-    while (pos_ < text_.size() && IsBlank(text_[pos_])) ++pos_;
+    while (pos_ < text_.size() && IsQueryBlank(text_[pos_])) ++pos_;
   }
 
   /// Takes the word at hand when it is `word` and ends there.
   bool TakeKeyword(std::string_view word) {
     if (text_.substr(pos_, word.size()) != word) return false;
     const size_t end = pos_ + word.size();
-    if (end < text_.size() && !IsBlank(text_[end]) && text_[end] != '(') return false;
+    if (end < text_.size() && !IsQueryBlank(text_[end]) && text_[end] != '(') return false;
     pos_ = end;
     return true;
   }
 
   bool AtEnd() {
     SkipBlanks();
-    return pos_ >= text_.size() || text_[pos_] == ')';
+    return pos_ >= text_.size() || (text_[pos_] == ')' && groups_ > 0);
+  }
+
+  /// "|" and "||" that stand alone are OR where there is something on both sides, as not in the frame of a table.
+  bool TakeBar() { return TakeKeyword("||") || TakeKeyword("|"); }
+
+  bool IsOrAhead() {
+    const size_t begin = pos_;
+    const bool is_or = TakeKeyword("OR") || TakeBar();
+    pos_ = begin;
+    return is_or;
   }
 
   QueryNode ParseOr() {
     QueryNode either(QueryNode::Type::kOr);
-    do {
+    either.children.push_back(ParseAnd());
+    while (!AtEnd()) {
       const size_t begin = pos_;
-      either.children.push_back(ParseAnd());
-      if (either.children.back().children.empty()) {
-        if (either.children.size() > 1 || !AtEnd())
-          conditions_.Refuse(begin, "OR needs a condition on both sides; add one");
+      const bool bar = TakeBar();
+      if (!bar) (void)TakeKeyword("OR");
+      QueryNode next = ParseAnd();
+      const bool nothing_before = either.children.back().children.empty();
+      if (!bar && (nothing_before || next.children.empty())) {
+        conditions_.Refuse(begin, "OR needs a condition on both sides; add one");
       }
-      SkipBlanks();
-    } while (TakeKeyword("OR"));
+      if (nothing_before) {
+        either.children.back() = std::move(next);
+      } else if (!next.children.empty()) {
+        either.children.push_back(std::move(next));
+      }
+    }
     for (QueryNode& child : either.children) {
       if (child.children.size() != 1) continue;
       QueryNode only = std::move(child.children.front());
@@ -102,10 +112,7 @@ class Parser {
     NumberRun run(text_);
     while (!AtEnd()) {
       const size_t begin = pos_;
-      if (TakeKeyword("OR")) {
-        pos_ = begin;
-        break;
-      }
+      if (IsOrAhead()) break;
       if (TakeKeyword("AND")) {
         if (all.children.empty() || AtEnd()) conditions_.Refuse(begin, "AND needs a condition on both sides; add one");
         has_and_ = true;
@@ -124,7 +131,7 @@ class Parser {
   bool IsSign(char sign) const {
     if (text_[pos_] != sign) return false;
     const size_t behind = text_.find_first_not_of("+-", pos_);
-    return behind != std::string_view::npos && !IsBlank(text_[behind]) && text_[behind] != ')';
+    return behind != std::string_view::npos && !IsQueryBlank(text_[behind]) && text_[behind] != ')';
   }
 
   QueryNode ParseUnary() {
@@ -162,30 +169,64 @@ class Parser {
     if (text_[pos_] == '(') {
       Deeper(begin);
       ++pos_;
+      ++groups_;
       QueryNode inner = ParseOr();
       if (pos_ >= text_.size()) conditions_.Refuse(begin, "this \"(\" is not closed; add a \")\"");
       ++pos_;
+      --groups_;
       --depth_;
       if (inner.type == QueryNode::Type::kAnd && inner.children.empty()) return QueryNode(QueryNode::Type::kAll);
       Require(inner);
       if (!inner.children.empty()) Count(inner, begin);
       return inner;
     }
-    std::string name;
-    size_t end = pos_;
-    while (end < text_.size() && IsNameChar(text_[end])) ++end;
-    if (end > pos_ && end < text_.size() && text_[end] == ':') {
-      name = text_.substr(pos_, end - pos_);
-      pos_ = end + 1;
-    }
-    const ConditionValue value = ParseValue();
-    if (!name.empty() && value.text.empty())
-      conditions_.Refuse(begin, "\"" + name + ":\" needs a value behind it; add one");
-    QueryNode node =
-        name.empty() ? conditions_.Words(QueryNode::Type::kText, value) : conditions_.Field(name, begin, value);
-    if (value.phrase) Require(node);
+    const std::optional<FieldStart> field = FieldAt(text_, begin);
+    QueryNode node = field.has_value() ? ParseField(*field) : ParseWords();
     Count(node, begin);
     return node;
+  }
+
+  ConditionValue ReadValue() {
+    ConditionValue value = ReadQueryValue(text_, pos_, groups_ > 0);
+    if (value.text.empty() && text_.substr(pos_, 1) == "\"") {
+      conditions_.Refuse(pos_, "this quote is not closed; add a \" at its end");
+    }
+    return value;
+  }
+
+  QueryNode ParseWords() {
+    const ConditionValue value = ReadValue();
+    if (!value.phrase) HintAtField(value.text);
+    QueryNode node = conditions_.Words(QueryNode::Type::kText, value);
+    if (value.phrase) Require(node);
+    return node;
+  }
+
+  /// For "autor:ada".
+  void HintAtField(const std::string& word) {
+    const size_t colon = word.find(':');
+    if (colon == std::string::npos || colon + 1 == word.size()) return;
+    const std::string meant = FieldMeantBy(std::string_view(word).substr(0, colon));
+    if (meant.empty()) return;
+    conditions_.Hint("\"" + word.substr(0, colon) + ":\" is no field, so it is looked for as text; there is " + meant +
+                     ":");
+  }
+
+  QueryNode ParseField(const FieldStart& field) {
+    const size_t begin = pos_;
+    pos_ = field.value;
+    try {
+      ConditionValue value = ReadValue();
+      if (value.text.empty()) {
+        conditions_.Refuse(begin, "\"" + field.name + ":\" needs a value behind it; add one");
+      }
+      value.text.insert(0, field.sign);
+      return conditions_.Field(field.name, begin, value);
+    } catch (const Error&) {
+      if (field.certain) throw;
+    }
+    pos_ = begin;
+    return ParseWords();
   }
 
   /// Plain words are as many as fit into the query.
@@ -198,35 +239,11 @@ class Parser {
     }
   }
 
-  ConditionValue ParseValue() {
-    ConditionValue value;
-    value.begin = pos_;
-    if (pos_ < text_.size() && text_[pos_] == '"') {
-      const size_t close = text_.find('"', pos_ + 1);
-      if (close == std::string_view::npos) conditions_.Refuse(pos_, "this quote is not closed; add a \" at its end");
-      value.text = text_.substr(pos_ + 1, close - pos_ - 1);
-      value.phrase = true;
-      pos_ = close + 1;
-    } else {
-      while (pos_ < text_.size() && !IsBlank(text_[pos_]) && !IsOneOfSpecial(text_[pos_])) value.text += text_[pos_++];
-    }
-    if (value.phrase && pos_ < text_.size() && text_[pos_] == '*') {
-      ++pos_;
-      value.prefix = true;
-    }
-    if (!value.phrase && value.text.size() > 1 && value.text.back() == '*') {
-      value.text.pop_back();
-      value.prefix = true;
-    }
-    return value;
-  }
-
-  static bool IsOneOfSpecial(char c) { return c == '(' || c == ')' || c == '"'; }
-
   const std::string_view text_;
   const ConditionReader conditions_;
   size_t pos_ = 0;        ///< what is to be read next
   size_t depth_ = 0;      ///< of the parentheses and NOTs that are open
+  size_t groups_ = 0;     ///< parentheses that are open
   size_t terms_ = 0;      ///< conditions so far, apart from plain words
   bool asks_ = false;     ///< there was a word or a condition
   bool has_and_ = false;  ///< "AND" was written
@@ -234,6 +251,8 @@ class Parser {
 
 }  // namespace
 
-QueryNode ParseQuery(std::string_view text, int64_t now) { return Parser(text, now).Parse(); }
+QueryNode ParseQuery(std::string_view text, int64_t now, std::vector<std::string>* hints) {
+  return Parser(text, now, hints).Parse();
+}
 
 }  // namespace ferrox::engine

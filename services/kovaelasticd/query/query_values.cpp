@@ -8,8 +8,8 @@
 #include <limits>
 #include <utility>
 
+#include "base/text.h"
 #include "common/clock.h"
-#include "services/kovaelasticd/text/schema.h"
 #include "wire/fields.h"
 
 namespace ferrox::engine {
@@ -84,21 +84,52 @@ std::optional<ValueRange> ParseAge(std::string_view text, int64_t now) {
   return std::nullopt;
 }
 
+/// A date as it was written; 0: not given.
+struct WrittenDate {
+  int64_t year = 0;
+  int64_t month = 0;
+  int64_t day = 0;
+};
+
+/// "2024", "2024-03", "2024-03-15", "03/2024", "15.03.2024"; instead of "-" also "/" and ".". Of "3/4/2024", where
+/// either may be the month, nothing.
+std::optional<WrittenDate> ReadDate(std::string_view text) {
+  int64_t parts[3] = {0, 0, 0};
+  size_t count = 0;
+  size_t year_at = 3;
+  char separator = '\0';
+  while (count < 3) {
+    const size_t before = text.size();
+    const std::optional<int64_t> number = TakeNumber(text, 4);
+    if (!number.has_value()) return std::nullopt;
+    if (before - text.size() == 4) year_at = std::min(year_at, count);
+    parts[count++] = *number;
+    if (text.empty()) break;
+    if ((separator != '\0' && text.front() != separator) || std::string_view("-/.").find(text.front()) == text.npos) {
+      return std::nullopt;
+    }
+    separator = text.front();
+    text.remove_prefix(1);
+  }
+  if (!text.empty() || (year_at != 0 && year_at != count - 1)) return std::nullopt;
+  if (year_at == 0) return WrittenDate{parts[0], count > 1 ? parts[1] : 0, parts[2]};
+  if (count == 2) return WrittenDate{parts[1], parts[0], 0};
+  if (separator != '/' || parts[0] > 12 || parts[0] == parts[1]) return WrittenDate{parts[2], parts[1], parts[0]};
+  return parts[1] > 12 ? std::optional(WrittenDate{parts[2], parts[0], parts[1]}) : std::nullopt;
+}
+
 /// A year, a month of one, or a day: its first and last second.
 std::optional<ValueRange> ParseCalendar(std::string_view text) {
-  const std::optional<int64_t> year = TakeNumber(text, 4);
-  if (!year.has_value() || *year < 1900) return std::nullopt;
-  if (text.empty()) return ValueRange{LocalTime(*year, 1, 1), LocalTime(*year + 1, 1, 1) - 1};
-  if (text.front() != '-') return std::nullopt;
-  text.remove_prefix(1);
-  const std::optional<int64_t> month = TakeNumber(text, 2);
-  if (!month.has_value() || *month < 1 || *month > 12) return std::nullopt;
-  if (text.empty()) return ValueRange{LocalTime(*year, *month, 1), LocalTime(*year, *month + 1, 1) - 1};
-  if (text.front() != '-') return std::nullopt;
-  text.remove_prefix(1);
-  const std::optional<int64_t> day = TakeNumber(text, 2);
-  if (!day.has_value() || *day < 1 || *day > 31 || !text.empty()) return std::nullopt;
-  return ValueRange{LocalTime(*year, *month, *day), LocalTime(*year, *month, *day + 1) - 1};
+  const size_t parts = 1 + static_cast<size_t>(std::count_if(text.begin(), text.end(),
+                                                             [](char c) { return c == '-' || c == '/' || c == '.'; }));
+  const std::optional<WrittenDate> date = ReadDate(text);
+  if (!date.has_value() || date->year < 1900) return std::nullopt;
+  const auto& [year, month, day] = *date;
+  if (parts == 1) return ValueRange{LocalTime(year, 1, 1), LocalTime(year + 1, 1, 1) - 1};
+  if (month < 1 || month > 12) return std::nullopt;
+  if (parts == 2) return ValueRange{LocalTime(year, month, 1), LocalTime(year, month + 1, 1) - 1};
+  if (day < 1 || day > 31) return std::nullopt;
+  return ValueRange{LocalTime(year, month, day), LocalTime(year, month, day + 1) - 1};
 }
 
 /// Reads "a", "a..b", "a..", "..b", ">a", ">=a", "<a", "<=a", where `parse` reads one value with its own extent.
@@ -123,59 +154,6 @@ std::optional<ValueRange> ParseRange(std::string_view text, Parse parse) {
   if (sign == '>') return ValueRange{equal ? value->low : value->high + 1, kMax};
   return ValueRange{kMin, equal ? value->high : value->low - 1};
 }
-
-std::string Lower(std::string_view text) {
-  std::string lower(text);
-  for (char& c : lower) {
-    if (c >= 'A' && c <= 'Z') c = static_cast<char>(c + ('a' - 'A'));
-  }
-  return lower;
-}
-
-/// A name of a kind of file.
-struct KindName {
-  const char* name;
-  Kind kind;
-};
-constexpr KindName kKindNames[] = {{"document", kDocument}, {"doc", kDocument}, {"audio", kAudio},   {"music", kAudio},
-                                   {"video", kVideo},       {"movie", kVideo},  {"image", kImage},   {"photo", kImage},
-                                   {"picture", kImage},     {"other", kOther},  {"folder", kFolder}, {"dir", kFolder},
-                                   {"directory", kFolder}};
-
-/// A name that people give a field, and the fields that it looks into.
-struct FriendlyName {
-  const char* name;
-  std::vector<std::string> fields;
-};
-const FriendlyName kFriendlyNames[] = {
-    {"title", {names::kKOVAMDTitle, names::kKOVAMDHeadline}},
-    {"author", {names::kKOVAMDAuthors, names::kKOVAMDCreator, names::kKOVAMDContributors, names::kKOVAMDComposer}},
-    {"artist", {names::kKOVAMDAuthors, names::kKOVAMDComposer, names::kKOVAMDParticipants}},
-    {"composer", {names::kKOVAMDComposer}},
-    {"album", {names::kKOVAMDAlbum}},
-    {"genre", {names::kKOVAMDMusicalGenre}},
-    {"subject", {names::kKOVAMDTitle, names::kKOVAMDHeadline}},
-    {"from", {names::kKOVAMDAuthors, names::kKOVAMDAuthorAddresses}},
-    {"to", {names::kKOVAMDRecipients, names::kKOVAMDRecipientAddresses}},
-    {"person", {names::kKOVAMDPeopleDisplayName, names::kKOVAMDParticipants}},
-    {"place", {names::kKOVAMDNamedLocation, names::kKOVAMDCity, names::kKOVAStateOrProvince, names::kKOVAMDCountry}},
-    {"publisher", {names::kKOVAMDPublishers, names::kKOVAMDOrganizations}},
-    {"copyright", {names::kKOVAMDCopyright, names::kKOVAMDRights}},
-    {"program", {names::kKOVAMDEncodingApplications, names::kKOVAMDAudioEncodingApplication, names::kKOVAMDCreator}},
-    {"codec", {names::kKOVAMDCodecs}},
-    {"rating", {names::kKOVAMDStarRating}},
-    {"type", {names::kKOVAMDContentType}},
-    {"keyword", {names::kKOVAMDKeywords, names::k_KOVAMDUserTags}},
-    {"tag", {names::kKOVAMDKeywords, names::k_KOVAMDUserTags}},
-    {"comment", {names::kKOVAMDComment, names::kKOVAMDFinderComment}},
-    {"description", {names::kKOVAMDDescription, names::kKOVAMDHeadline}},
-    {"camera", {names::kKOVAMDAcquisitionMake, names::kKOVAMDAcquisitionModel}},
-    {"language", {names::kKOVAMDLanguages}},
-    {"owner", {names::kKOVAMDOwnerUserID}},
-    {"group", {names::kKOVAMDOwnerGroupID}},
-    {"content", {field::kTextContent}},
-    {"text", {field::kTextContent}},
-};
 
 /// A whole number.
 std::optional<ValueRange> ParseNumber(std::string_view text) {
@@ -216,7 +194,7 @@ std::optional<ValueRange> ParseDurationRange(std::string_view text, int64_t /*no
   return alone.has_value() ? alone : ParseRange(text, &ParseExactDuration);
 }
 
-const RangeField kRangeFields[] = {
+const std::vector<RangeField> kRangeFields = {
     {"duration",
      {names::kKOVAMDDurationSecond},
      &ParseDurationRange,
@@ -236,45 +214,24 @@ const RangeField kRangeFields[] = {
 
 }  // namespace
 
+const std::vector<RangeField>& RangeFields() { return kRangeFields; }
+
 const RangeField* FindRangeField(std::string_view name) {
-  const std::string lower = Lower(name);
+  const std::string lower = base::LowerAscii(std::string(name));
   for (const RangeField& known : kRangeFields) {
     if (lower == known.name) return &known;
   }
   return nullptr;
 }
 
-std::string KnownFields() {
-  std::string known = "name, kind, ext, path, size, date";
-  for (const FriendlyName& field : kFriendlyNames) known += std::string(", ") + field.name;
-  for (const RangeField& field : kRangeFields) known += std::string(", ") + field.name;
-  return known + " and the full KOVAMD names";
-}
-
 std::optional<ValueRange> ParseSizeRange(std::string_view text) { return ParseRange(text, &ParseSize); }
 
 std::optional<ValueRange> ParseDateRange(std::string_view text, int64_t now) {
-  const std::string lower = Lower(text);
+  const std::string lower = base::LowerAscii(std::string(text));
   if (lower == "today") return DayOf(now, 0);
   if (lower == "yesterday") return DayOf(now, 1);
   if (const auto age = ParseAge(lower, now)) return age;
   return ParseRange(text, &ParseCalendar);
-}
-
-std::optional<int32_t> ParseKind(std::string_view text) {
-  const std::string lower = Lower(text);
-  for (const KindName& known : kKindNames) {
-    if (lower == known.name) return known.kind;
-  }
-  return std::nullopt;
-}
-
-std::vector<std::string> FriendlyFields(std::string_view name) {
-  const std::string lower = Lower(name);
-  for (const FriendlyName& known : kFriendlyNames) {
-    if (lower == known.name) return known.fields;
-  }
-  return {};
 }
 
 std::optional<int64_t> UserNumberOf(const std::string& name) {

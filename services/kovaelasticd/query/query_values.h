@@ -8,8 +8,8 @@
 
 namespace ferrox::engine {
 
-// The values of conditions: sizes, dates, durations, kinds, and the names that people give fields. All of them read
-// what stands behind "name:" and answer with nothing where they cannot; ConditionReader makes a sentence of that.
+// The values of conditions: sizes, dates, durations, users and groups. All of them read what stands behind "name:" and
+// answer with nothing where they cannot; ConditionReader makes a sentence of that.
 
 /// A range of numbers, both ends included.
 struct ValueRange {
@@ -31,17 +31,9 @@ struct RangeField {
   std::optional<ValueRange> (*parse)(std::string_view text, int64_t now);
   const char* example;
 };
+const std::vector<RangeField>& RangeFields();
 /// Null when the name stands for none.
 const RangeField* FindRangeField(std::string_view name);
-
-/// The kinds that a name stands for; nothing when it is no kind.
-std::optional<int32_t> ParseKind(std::string_view text);
-
-/// The document fields that a friendly name stands for; empty when it is none.
-std::vector<std::string> FriendlyFields(std::string_view name);
-
-/// All names that can stand before a ":", for people.
-std::string KnownFields();
 
 /// The number of a user or group of this host; nothing when there is none of that name. May ask a directory service.
 std::optional<int64_t> UserNumberOf(const std::string& name);
