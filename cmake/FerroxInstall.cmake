@@ -42,12 +42,13 @@ install(FILES ${CMAKE_SOURCE_DIR}/packaging/completions/fileindexctl.bash RENAME
 install(FILES ${CMAKE_SOURCE_DIR}/packaging/completions/_fileindexctl
         DESTINATION ${CMAKE_INSTALL_DATADIR}/zsh/site-functions)
 
-# systemd looks for units and tmpfiles below "lib", whatever the folder of the libraries is called. The units name the
-# programs with the prefix that is given when they are installed.
-set(units kovaelasticd kova-access kovanotifyd kovacontentextractd fileindexd fileindex-prepare)
+# systemd looks for units, tmpfiles and sysusers below "lib", whatever the folder of the libraries is called. The units
+# name the programs with the prefix that is given when they are installed.
+set(units kovaelasticd kova-engine-user kova-access kovanotifyd kovacontentextractd fileindexd fileindex-prepare)
 install(CODE "
   set(bin_folder \${CMAKE_INSTALL_PREFIX}/${CMAKE_INSTALL_BINDIR})
   set(sbin_folder \${CMAKE_INSTALL_PREFIX}/${CMAKE_INSTALL_SBINDIR})
+  set(sysusers_folder \${CMAKE_INSTALL_PREFIX}/lib/sysusers.d)
   foreach(unit ${units})
     configure_file(${CMAKE_SOURCE_DIR}/packaging/systemd/\${unit}.service.in ${CMAKE_BINARY_DIR}/\${unit}.service @ONLY)
   endforeach()")
@@ -55,3 +56,4 @@ foreach(unit ${units})
   install(FILES ${CMAKE_BINARY_DIR}/${unit}.service DESTINATION lib/systemd/system)
 endforeach()
 install(FILES ${CMAKE_SOURCE_DIR}/packaging/tmpfiles.d/libfileindex.conf DESTINATION lib/tmpfiles.d)
+install(FILES ${CMAKE_SOURCE_DIR}/packaging/sysusers.d/libfileindex.conf DESTINATION lib/sysusers.d)

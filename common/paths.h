@@ -24,9 +24,15 @@ FERROX_EXPORT std::string InstanceRootProblem();
 /// The daemons' sockets (docs/formats/daemon.md). All of these paths go through InstancePath.
 inline constexpr char kFileIndexdSocket[] = "/var/run/fileindexd.sock";
 inline constexpr char kElasticdSocket[] = "/var/run/kovaelasticd.sock";
+/// Where the engine's own user has its runtime files, and the socket that the path above is then a link to. No longer
+/// than that path.
+inline constexpr char kElasticdRunFolder[] = "/var/run/kovaelasticd";
+inline constexpr char kElasticdOwnSocket[] = "/var/run/kovaelasticd/sock";
 inline constexpr char kNotifydSocket[] = "/var/run/kovanotifyd.sock";
 inline constexpr char kAccessSocket[] = "/var/run/kova-access.sock";
 inline constexpr char kContentExtractdSocket[] = "/var/run/kovacontentextractd.sock";
+/// The engine's list of indices. Whose it is, is the engine's user (services/support/engine_user.h).
+inline constexpr char kElasticdFolder[] = "/var/lib/kova/kovaelasticd";
 /// The indexed folders and the states of indexing; each is written under its lock file below.
 inline constexpr char kConfigurationFolder[] = "/var/packages/Ferrox/etc";
 inline constexpr char kFileIndexFoldersCfgPath[] = "/var/packages/Ferrox/etc/fileindex.folders";

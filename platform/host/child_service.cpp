@@ -51,6 +51,15 @@ pid_t ReadPid(int fd) {
   return pid > 0 ? static_cast<pid_t>(pid) : 0;
 }
 
+/// Whether what the pid file says is to be believed. In an instance of root's the search engine may be a user of its
+/// own, who can write its pid file, but must not have root signal other processes.
+bool IsBelieved(const ServiceRow& service, int file, pid_t pid) {
+  struct stat info = {}, folder = {}, process = {};
+  if (fstat(file, &info) != 0 || stat(base::FolderOf(PidPath(service)).c_str(), &folder) != 0) return false;
+  if (info.st_uid == 0 || info.st_uid == geteuid() || folder.st_uid != 0) return true;
+  return stat(("/proc/" + std::to_string(pid)).c_str(), &process) == 0 && process.st_uid == info.st_uid;
+}
+
 /// The process that holds the service's pid file, or 0. The lock is only tried when the written process exists, so that
 /// looking does not get in the way of a daemon that is just taking it.
 pid_t RunningPid(const ServiceRow& service) {
@@ -61,7 +70,7 @@ pid_t RunningPid(const ServiceRow& service) {
   }
   if (!file.Valid()) return 0;
   const pid_t pid = ReadPid(file.Get());
-  if (pid == 0 || (kill(pid, 0) != 0 && errno == ESRCH)) return 0;
+  if (pid == 0 || (kill(pid, 0) != 0 && errno == ESRCH) || !IsBelieved(service, file.Get(), pid)) return 0;
   return flock(file.Get(), LOCK_SH | LOCK_NB) != 0 && errno == EWOULDBLOCK ? pid : 0;
 }
 

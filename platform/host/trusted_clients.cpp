@@ -4,21 +4,16 @@
 #include <syslog.h>
 
 #include <algorithm>
-#include <chrono>
 #include <cstdio>
 #include <memory>
-#include <optional>
 #include <string>
 
-#include "base/mutex.h"
 #include "platform/host/configuration.h"
 #include "platform/host/log.h"
 
 namespace kova::host {
 
 namespace {
-
-constexpr std::chrono::seconds kReadAgain{1};
 
 /// The uids of local accounts; of a name that is not there, none.
 std::vector<uid_t> LocalUids(const std::vector<std::string>& names) {
@@ -38,29 +33,12 @@ std::vector<uid_t> LocalUids(const std::vector<std::string>& names) {
   return uids;
 }
 
-TrustedClients ReadTrustedClients() {
-  const std::shared_ptr<const Configuration> settings = GetConfiguration();
-  if (!settings->problem.empty() || settings->trusted_clients.empty()) return {{}, settings->least_user};
-  return {LocalUids(settings->trusted_clients), settings->least_user};
-}
-
-struct LastRead {
-  base::Mutex mutex;
-  std::optional<std::chrono::steady_clock::time_point> at BASE_GUARDED_BY(mutex);
-  TrustedClients clients BASE_GUARDED_BY(mutex);
-};
-
 }  // namespace
 
 TrustedClients GetTrustedClients() {
-  static auto* last = new LastRead;  // never freed, like the settings
-  const auto now = std::chrono::steady_clock::now();
-  const base::MutexLock lock(last->mutex);
-  if (!last->at.has_value() || now >= *last->at + kReadAgain) {
-    last->clients = ReadTrustedClients();
-    last->at = now;
-  }
-  return last->clients;
+  const std::shared_ptr<const Configuration> settings = GetConfiguration();
+  if (!settings->problem.empty() || settings->trusted_clients.empty()) return {{}, settings->least_user};
+  return {LocalUids(settings->trusted_clients), settings->least_user};
 }
 
 }  // namespace kova::host

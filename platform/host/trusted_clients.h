@@ -13,8 +13,9 @@ struct TrustedClients {
   uint32_t least_user = 1000;  ///< for no user with a smaller uid
 };
 
-/// Those of now, or of up to a second ago. They are accounts of /etc/passwd: nobody on the network is waited for, or
-/// can become one. A name without such an account is logged; settings with a mistake name nobody. Any thread may call.
+/// Those of now: reads /etc/passwd where the settings name any. They are accounts of that file: nobody on the network
+/// is waited for, or can become one. A name without such an account is logged; settings with a mistake name nobody. Any
+/// thread may call.
 TrustedClients GetTrustedClients();
 
 }  // namespace kova::host

@@ -131,12 +131,13 @@ void IndexDaemon::Reconcile() {
 }
 
 std::string IndexDaemon::Handle(const std::string& request, const services::Peer& peer) {
-  return services::AnswerJsonCommand(request, peer, [this](const std::string& type, const Json::Value& data) {
+  const auto answer = [this](const std::string& type, const Json::Value& data) {
     for (const Command& command : kCommands) {
       if (type == command.type) return (this->*command.run)(data);
     }
     throw Error(Error::kBadArgument, "unknown command: " + type);
-  });
+  };
+  return services::AnswerJsonCommand(request, peer, answer, {"sync", "status"});
 }
 
 Json::Value IndexDaemon::OnPause(const Json::Value& data) {

@@ -15,6 +15,7 @@
 #include "platform/host/share_search.h"
 #include "services/fileindexd/index_daemon.h"
 #include "services/support/daemon.h"
+#include "services/support/engine_user.h"
 
 namespace {
 
@@ -74,6 +75,7 @@ int main(int argc, char** argv) try {
                                        [&index_daemon](const std::string& request, const ferrox::services::Peer& peer) {
                                          return index_daemon.Handle(request, peer);
                                        });
+  ferrox::services::AdmitEngine(server_options.socket_path);
   index_daemon.Start();
   daemon.NotifyReady();
   server.Run(daemon.StopFd());

@@ -10,9 +10,6 @@ namespace ferrox::access {
 
 namespace {
 
-/// Who may ask what others may open: whom the engine runs as.
-bool MayAsk(const services::Peer& peer) { return services::IsRootOrOwner(peer); }
-
 /// Of a file that the user may not open, nothing is told.
 Json::Value JsonOf(const wire::LiveFile& file) {
   Json::Value json(Json::objectValue);
@@ -21,6 +18,14 @@ Json::Value JsonOf(const wire::LiveFile& file) {
   if (file.stamp.empty()) return json;
   if (file.folder) json["folder"] = true;
   json["stamp"] = file.stamp;
+  return json;
+}
+
+Json::Value JsonOf(const wire::Trust& trust) {
+  Json::Value json;
+  json["least_user"] = trust.least_user;
+  Json::Value& clients = json["clients"] = Json::Value(Json::arrayValue);
+  for (const uint32_t uid : trust.clients) clients.append(uid);
   return json;
 }
 
@@ -37,7 +42,7 @@ services::FrameReply AccessServer::Handle(const std::string& request, const serv
   const auto answer = [&](const std::string& type, const Json::Value& data) {
     return Answer(ReadRequest(type, data), descriptor);
   };
-  std::string reply = services::AnswerJsonCommand(request, peer, answer, &MayAsk);
+  std::string reply = services::AnswerJsonCommand(request, peer, answer, {"look", "trust"});
   return {std::move(reply), std::move(descriptor)};
 }
 
@@ -48,6 +53,7 @@ Json::Value AccessServer::Answer(const Request& request, base::UniqueFd& descrip
     data["unresponsive"] = limit_.Held();
     return data;
   }
+  if (request.kind == Request::Kind::kTrust) return JsonOf(trust_());
   const services::OpenLimit::Turn turn(limit_, request.root);
   RunAsUser(request.user, [&] {
     const LiveShare share(own_descriptors_, request.root);

@@ -3,12 +3,15 @@
 #include <cstdio>
 #include <cstring>
 #include <exception>
+#include <utility>
 
 #include <kova/log.h>
 
 #include "common/paths.h"
+#include "platform/host/trusted_clients.h"
 #include "services/kova-access/access_server.h"
 #include "services/support/daemon.h"
+#include "services/support/engine_user.h"
 #include "services/support/frame_server.h"
 
 namespace {
@@ -29,12 +32,17 @@ constexpr unsigned kSpareThreads = 2;
 constexpr uint32_t kRequestMaxBytes = 8U << 20;
 constexpr unsigned kConnectionsMax = 64;
 
+wire::Trust ReadTrust() {
+  kova::host::TrustedClients clients = kova::host::GetTrustedClients();
+  return {std::move(clients.uids), clients.least_user};
+}
+
 void Serve() {
   services::Daemon daemon("kova-access");
   services::OpenLimit::Options limit;
   limit.at_once = kAtOnce;
   limit.root_at_once = kRootAtOnce;
-  access::AccessServer access_server(limit);
+  access::AccessServer access_server(limit, &ReadTrust);
   services::FrameServerOptions options;
   options.socket_path = InstancePath(kAccessSocket);
   options.request_limit_bytes = kRequestMaxBytes;
@@ -44,6 +52,7 @@ void Serve() {
   services::FrameServer server(options, [&](const std::string& request, const services::Peer& peer) {
     return access_server.Handle(request, peer);
   });
+  services::AdmitEngine(options.socket_path);
   daemon.NotifyReady();
   server.Run(daemon.StopFd());
 }

@@ -37,6 +37,7 @@ User ReadUser(const Json::Value& data) {
 
 Request::Kind ReadKind(const std::string& type) {
   if (type == "status") return Request::Kind::kStatus;
+  if (type == "trust") return Request::Kind::kTrust;
   FERROX_FAIL_IF(type != "look" && type != "open", Error::kBadArgument, "unknown command " + type);
   return type == "look" ? Request::Kind::kLook : Request::Kind::kOpen;
 }
@@ -45,7 +46,7 @@ Request::Kind ReadKind(const std::string& type) {
 
 Request ReadRequest(const std::string& type, const Json::Value& data) {
   Request request{ReadKind(type), {}, {}, {}};
-  if (request.kind == Request::Kind::kStatus) return request;
+  if (request.kind == Request::Kind::kStatus || request.kind == Request::Kind::kTrust) return request;
   FERROX_FAIL_IF(!data.isObject(), Error::kBadArgument, "\"data\" is no object");
   request.user = ReadUser(data);
   request.root = ReadPath(data["root"]);

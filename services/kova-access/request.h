@@ -11,7 +11,7 @@ namespace ferrox::access {
 
 /// What is asked (docs/formats/access.md). Whoever asks may say anything; what is read here is within its bounds.
 struct Request {
-  enum class Kind { kStatus, kLook, kOpen };
+  enum class Kind { kStatus, kTrust, kLook, kOpen };
 
   Kind kind;
   User user;                       ///< neither uid 0 nor an id that the kernel takes for "unchanged"

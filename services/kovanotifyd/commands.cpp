@@ -75,12 +75,13 @@ constexpr Command kCommands[] = {
 }  // namespace
 
 std::string HandleCommand(Notifier& notifier, const std::string& request, const services::Peer& peer) {
-  return services::AnswerJsonCommand(request, peer, [&](const std::string& type, const Json::Value& data) {
+  const auto answer = [&](const std::string& type, const Json::Value& data) {
     for (const Command& command : kCommands) {
       if (type == command.type) return command.run(notifier, data);
     }
     throw Error(Error::kBadArgument, "unknown command: " + type);
-  });
+  };
+  return services::AnswerJsonCommand(request, peer, answer, {"sync"});
 }
 
 }  // namespace ferrox::notifyd

@@ -15,6 +15,7 @@
 #include "services/kovanotifyd/notifier.h"
 #include "services/kovanotifyd/ways.h"
 #include "services/support/daemon.h"
+#include "services/support/engine_user.h"
 
 namespace {
 
@@ -79,6 +80,7 @@ int main(int argc, char** argv) try {
                                        [&notifier](const std::string& request, const ferrox::services::Peer& peer) {
                                          return ferrox::notifyd::HandleCommand(notifier, request, peer);
                                        });
+  ferrox::services::AdmitEngine(server_options.socket_path);
   std::thread server_thread([&] { server.Run(daemon.StopFd()); });
   const base::ScopeExit stop([&] {
     server.Stop();

@@ -2,10 +2,13 @@
 
 #include <unistd.h>
 
+#include <algorithm>
+
 #include "common/error.h"
 #include "common/json_scan.h"
 #include "common/json_util.h"
 #include "common/log.h"
+#include "services/support/engine_user.h"
 
 namespace ferrox::services {
 
@@ -22,9 +25,14 @@ Json::Value ErrorReply(int code, const std::string& message) {
   return reply;
 }
 
+constexpr char kNotObeyed[] = "only root and the owner of this instance may steer it";
+
 /// A request is a JSON text with or without the terminating zero that the library sends.
-Json::Value Dispatch(const std::string& request, bool is_obeyed, const JsonCommand& command) {
-  FERROX_FAIL_IF(!is_obeyed, Error::kEngineNotPermitted, "only root and the owner of this instance may steer it");
+Json::Value Dispatch(const std::string& request, const Peer& peer, const JsonCommand& command,
+                     std::initializer_list<const char*> of_engine) {
+  const bool steers = IsRootOrOwner(peer);
+  const bool is_obeyed = steers || (of_engine.size() != 0 && IsEngine(peer));
+  FERROX_FAIL_IF(!is_obeyed, Error::kEngineNotPermitted, kNotObeyed);
   FERROX_FAIL_IF(CountJsonValues(request) > kValuesMax, Error::kBadArgument,
                  "the request has too many values; no command needs more than " + std::to_string(kValuesMax));
   const size_t end = request.find_last_not_of('\0');
@@ -33,6 +41,9 @@ Json::Value Dispatch(const std::string& request, bool is_obeyed, const JsonComma
   FERROX_FAIL_IF(!parsed, Error::kBadArgument, "the request is not a JSON object");
   std::string type;
   GetJsonValue(type, json, "type", true);
+  const bool may =
+      steers || std::any_of(of_engine.begin(), of_engine.end(), [&](const char* one) { return type == one; });
+  FERROX_FAIL_IF(!may, Error::kEngineNotPermitted, kNotObeyed);
   return command(type, json["data"]);
 }
 
@@ -41,10 +52,10 @@ Json::Value Dispatch(const std::string& request, bool is_obeyed, const JsonComma
 bool IsRootOrOwner(const Peer& peer) { return peer.uid == 0 || peer.uid == geteuid(); }
 
 std::string AnswerJsonCommand(const std::string& request, const Peer& peer, const JsonCommand& command,
-                              bool (*is_obeyed)(const Peer& peer)) {
+                              std::initializer_list<const char*> of_engine) {
   try {
     Json::Value reply;
-    reply["data"] = Dispatch(request, is_obeyed(peer), command);
+    reply["data"] = Dispatch(request, peer, command, of_engine);
     reply["success"] = true;
     return toString(reply);
   } catch (const Error& error) {

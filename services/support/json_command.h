@@ -1,6 +1,7 @@
 #pragma once
 
 #include <functional>
+#include <initializer_list>
 #include <string>
 
 #include <json/value.h>
@@ -16,9 +17,9 @@ using JsonCommand = std::function<Json::Value(const std::string& type, const Jso
 bool IsRootOrOwner(const Peer& peer);
 
 /// Runs on the calling thread for as long as the command does.
-/// Answers a request of the form that docs/formats/daemon.md describes; never throws. Only those are obeyed for whom
-/// `is_obeyed` holds.
+/// Answers a request of the form that docs/formats/daemon.md describes; never throws. Only root and the owner are
+/// obeyed, and in the commands `of_engine` the engine's own user (services/support/engine_user.h).
 std::string AnswerJsonCommand(const std::string& request, const Peer& peer, const JsonCommand& command,
-                              bool (*is_obeyed)(const Peer& peer) = &IsRootOrOwner);
+                              std::initializer_list<const char*> of_engine = {});
 
 }  // namespace ferrox::services

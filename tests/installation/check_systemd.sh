@@ -33,6 +33,7 @@ if [[ ! -e /srv/docs ]]; then
   expect active active active active
   finds lantern
   fileindexctl search --as 50001:50001 lantern
+  [[ "$(stat -c %U "/proc/$(pidof kovaelasticd)")" == kova-engine ]]
   echo lighthouse >/srv/docs/b.txt
   finds lighthouse
   for user in 5001 5002; do

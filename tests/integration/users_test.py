@@ -7,7 +7,7 @@ import subprocess
 import sys
 import unittest
 
-from instance import BIN, InstanceTestCase, wait_for, write
+from instance import BIN, InstanceTestCase, process_facts, wait_for, write
 
 sys.path.insert(0, os.path.join(os.path.dirname(os.path.abspath(__file__)), "..", "rights"))
 
@@ -16,6 +16,7 @@ from rights_world import USERS, World  # noqa: E402
 
 TEAM = 50010
 ANN, BOB = User(50001, [50001, TEAM]), User(50002, [50002])  # no accounts: the kernel and the service go by numbers
+ENGINE = User(50009, [50009])
 
 
 @unittest.skipUnless(os.geteuid() == 0, "takes on other users; needs root")
@@ -23,6 +24,7 @@ class UsersTest(InstanceTestCase):
     def setUp(self):
         super().setUp()
         os.chmod(self.instance.root, 0o755)
+        subprocess.run([os.path.join(BIN, "kovaelasticd"), "--prepare", str(ENGINE.uid)], env=self.instance.env, check=True)
         self.ctl("up")
 
     def as_user(self, user, *words, program=os.path.join(BIN, "fileindexctl")):
@@ -208,6 +210,50 @@ esac
                 self.assertNotIn(b"all the same", done.stdout)
         self.assertIn(b"lantern in ann/a.txt", self.for_user(ANN, "show", f"{plans}/ann/a.txt").stdout)
         self.assertEqual(b"lantern in ann/a.txt", self.for_user(ANN, "show", "--text", "/plans/ann/a.txt").stdout)
+
+    def test_the_engine_is_a_user_of_its_own_and_is_given_what_root_made_alone(self):
+        """The indices of an engine of root's, of which one is elsewhere, and what others could have put in their place."""
+        root, prepare = self.instance.root, [os.path.join(BIN, "kovaelasticd"), "--prepare", str(ENGINE.uid)]
+        self.ctl("down")
+        for folder, _, files in os.walk(f"{root}/var/lib/kova"):  # as an earlier version left it
+            for name in [".", *files]:
+                os.chown(f"{folder}/{name}", 0, 0)
+        os.chmod(f"{root}/var/lib/kova/fileindex", 0o700)
+        os.remove(f"{root}/var/run/kovaelasticd.sock")
+        self.ctl("up")
+        folder = self.instance.add_share("plans")
+        for path in (f"{root}/elsewhere", f"{folder}/index"):
+            request = {"command": "index_create", "data": {"id": os.path.basename(path), "path": path}}
+            self.assertTrue(self.instance.ask("kovaelasticd", request)["success"])
+        write(f"{folder}/a.txt", "lantern")
+        wait_for(lambda: self.instance.search("lantern"), "the file")
+        self.assertEqual(3, subprocess.run(prepare, env=self.instance.env, stderr=subprocess.DEVNULL, check=False).returncode)
+        self.ctl("down")
+        db = f"{root}/var/lib/kova/fileindex/db"
+        (index,) = glob.glob(f"{db}/*")
+        os.chmod(folder, 0o777)
+        write(f"{root}/root's", "")
+        os.link(f"{root}/root's", f"{index}/hard")
+        os.symlink(f"{root}/root's", f"{index}/soft")
+        subprocess.run(prepare, env=self.instance.env, check=True)
+        os.symlink(root, f"{db}/later.index")
+        os.mkdir(f"{db}/open.index", 0o777)
+        os.chmod(f"{db}/open.index", 0o777)
+        os.mkdir(f"{db}/by_root.index", 0o700)
+        write(f"{index}/later", "")
+        self.ctl("up")
+        owners = {path: os.lstat(path).st_uid for path in
+                 (index, f"{index}/index.sqlite", f"{db}/by_root.index", f"{root}/elsewhere/index.sqlite", f"{root}/root's",
+                  root, f"{root}/var/lib/kova", f"{folder}/index", f"{db}/open.index", f"{index}/later")}
+        self.assertEqual([ENGINE.uid] * 4 + [0] * 6, list(owners.values()), owners)
+        self.assertEqual("0000000000000000", process_facts(self.instance.pid("kovaelasticd"))["CapPrm"])
+        self.assertIn("a.txt", self.found(ANN, "lantern"))
+        for daemon, kind, code in (("fileindexd", "status", None), ("fileindexd", "pause", 1406), ("kovanotifyd", "sync", None),
+                                   ("kovanotifyd", "status", 1406), ("kova-access", "trust", None), ("kova-access", "open", 1406)):
+            request = {"type": kind, "data": {}}
+            reply = Child(ENGINE, lambda daemon=daemon, request=request: self.instance.ask(daemon, request)).result()
+            self.assertEqual(code, None if reply["success"] else reply["error"]["code"], (daemon, kind, reply))
+        self.assertFalse(Child(ANN, lambda: os.access(f"{root}/var/run/fileindexd.sock", os.W_OK, effective_ids=True)).result())
 
     def test_the_rules_that_are_named_are_those_of_the_kernel(self):
         share, outside = (f"{os.path.realpath(self.instance.root)}/vol/{name}" for name in ("rights", "outside"))

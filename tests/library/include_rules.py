@@ -47,7 +47,8 @@ EXCEPTIONS = {
     # The daemons' main functions know the host that they run on: its table of shares, its registry, its services.
     "services/fileindexd/main.cpp": ["platform/host/samba_shares.h", "platform/host/share_search.h",
                                      "platform/host/mounts.h"],
-    "services/kovaelasticd/main.cpp": ["platform/host/trusted_clients.h", "platform/host/account_lookup.h"],
+    "services/kovaelasticd/main.cpp": ["platform/host/account_lookup.h"],
+    "services/kova-access/main.cpp": ["platform/host/trusted_clients.h"],
     "services/kovanotifyd/main.cpp": ["platform/host/configuration.h", "platform/host/notify_registry.h"],
     "services/supervisor/main.cpp": ["platform/host/service_log.h", "platform/host/child_service.h"],
 }

@@ -12,6 +12,7 @@
 #include <json/value.h>
 
 #include "base/mutex.h"
+#include "wire/trust.h"
 
 namespace ferrox::engine {
 
@@ -30,14 +31,11 @@ struct NamedUser {
 using NamedUserPtr = std::shared_ptr<const NamedUser>;
 
 /// Who may ask for users by name, and for whom.
-struct Trust {
-  std::vector<uint32_t> clients = {};
-  uint32_t least_user = 1000;
-};
+using wire::Trust;
 
 /// Where the engine learns of users. Any thread calls these.
 struct UserSources {
-  /// The settings of now; must not block.
+  /// The settings of now. It is called where connections are taken, and must not block for longer than now and then.
   std::function<Trust()> trust = [] { return Trust(); };
   /// What `kova-accounts` writes for the arguments; nothing when it fails. Blocks for some seconds at most.
   std::function<std::optional<std::string>(const std::vector<std::string>& arguments)> look_up = [](const auto&) {

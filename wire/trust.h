@@ -1,0 +1,20 @@
+#pragma once
+
+#include <chrono>
+#include <cstdint>
+#include <optional>
+#include <vector>
+
+/// Whose programs may search for other users ("trusted_clients" and "least_user" of the settings). The settings are
+/// root's alone; the search engine asks `kova-access`, which may read them (docs/formats/access.md).
+namespace ferrox::wire {
+
+struct Trust {
+  std::vector<uint32_t> clients = {};  ///< their uids
+  uint32_t least_user = 1000;          ///< for no user with a smaller uid
+};
+
+/// Blocks at most `longest` for each wait, of which there are few. Nothing when it cannot be told.
+std::optional<Trust> AskTrust(std::chrono::milliseconds longest);
+
+}  // namespace ferrox::wire
