@@ -8,6 +8,7 @@
 #include <json/value.h>
 
 #include "services/kovaelasticd/query/query.h"
+#include "services/kovaelasticd/store/fts.h"
 #include "services/kovaelasticd/store/sqlite_store.h"
 
 namespace ferrox::engine {
@@ -46,5 +47,17 @@ inline std::string Paths(const SearchReply& reply, bool sorted = true) {
 }
 
 inline std::string FindPaths(IndexStore& store, const std::string& text) { return Paths(Find(store, text)); }
+
+/// The words of a full-text table of a file that nobody writes to, in the order of their bytes; where they stand, too.
+inline std::string TermsIn(const std::string& file, const std::string& table, const std::string& columns = "term",
+                           const std::string& kind = "row") {
+  Database database(file, Database::Mode::kRead);
+  RegisterFullText(database);
+  database.Execute("CREATE VIRTUAL TABLE temp.terms USING fts5vocab('main', '" + table + "', '" + kind + "')");
+  std::string terms;
+  for (Statement rows = database.Prepare("SELECT " + columns + " FROM temp.terms"); rows.Step();)
+    terms += std::string(rows.Text(0)) + " ";
+  return terms;
+}
 
 }  // namespace ferrox::engine

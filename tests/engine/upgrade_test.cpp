@@ -23,11 +23,12 @@ using std::chrono::milliseconds;
 /// An index in a folder of its own, as an engine of format 2 has written it.
 class UpgradeTest : public EngineTest {
  protected:
-  UpgradeTest() {
-    const std::string packed = test::ReadFile(FERROX_TEST_DATA "/index_format_2.sqlite.zst");
-    kept_.resize(ZSTD_getFrameContentSize(packed.data(), packed.size()));
-    EXPECT_EQ(kept_.size(), ZSTD_decompress(kept_.data(), kept_.size(), packed.data(), packed.size()));
-    PutKept("a");
+  UpgradeTest() { PutKept("a"); }
+  static std::string Unpacked(const std::string& name) {
+    const std::string packed = test::ReadFile(FERROX_TEST_DATA "/" + name);
+    std::string content(ZSTD_getFrameContentSize(packed.data(), packed.size()), '\0');
+    EXPECT_EQ(content.size(), ZSTD_decompress(content.data(), content.size(), packed.data(), packed.size()));
+    return content;
   }
   void PutKept(const std::string& name) const {
     fs::create_directories(folder_ / name);
@@ -43,7 +44,7 @@ class UpgradeTest : public EngineTest {
     for (const char* name : {"KOVAMDPath", "KOVAMDParent"}) mappings["properties"][name]["_all"] = false;
     return std::make_shared<Schema>(mappings);
   }
-  /// What a good number of queries find, with scores and snippets.
+  /// What a good number of queries find, with snippets. Scores are others once texts have titles.
   template <typename Searched>
   static std::string Answers(Searched& index) {
     std::string answers;
@@ -54,7 +55,7 @@ class UpgradeTest : public EngineTest {
       SearchRequest request;
       request.query = &query;
       for (const SearchHit& hit : index.Search(request).hits)
-        answers += hit.path + " " + std::to_string(hit.score) + " " + hit.snippet + toString(hit.fields) + "\n";
+        answers += hit.path + " " + hit.snippet + toString(hit.fields) + "\n";
       answers += std::string("= ") + text + "\n";
     }
     return answers;
@@ -63,7 +64,7 @@ class UpgradeTest : public EngineTest {
     while (index.Upgrading().has_value()) std::this_thread::sleep_for(milliseconds(1));
   }
 
-  std::string kept_;
+  const std::string kept_ = Unpacked("index_format_2.sqlite.zst");
   const std::string file_ = IndexFile(folder_ / "a");
 };
 
@@ -85,75 +86,74 @@ TEST_F(UpgradeTest, OrdinaryUsersAreToldToWaitUntilTheRightsAreRecorded) {
   EXPECT_EQ(SendText(search, 54321)["data"]["total"], 0) << "what has no access record is closed";
 }
 
-TEST_F(UpgradeTest, AFileOfFormat2AnswersAsBeforeWhetherItsWordsAreTakenOverOrCutAgain) {
-  for (const bool cut_words : {false, true}) {
-    SCOPED_TRACE(cut_words);
-    PutKept("a");
-    UpgradeOptions options;
-    options.cut_words = cut_words;
-    options.turn_bytes = 1;
-    int64_t last = 0;
-    options.on_turn = [&last](int64_t done, int64_t /*of*/) { last = done; };
-    auto old = std::make_unique<IndexUpgrade>(file_, NoPaths());
-    const std::string before = Answers(*old);
-    EXPECT_NE(before.find("harbour"), std::string::npos);
-    WriteUpgraded(file_, NoPaths(), options);
-    EXPECT_EQ(last, cut_words ? 7 : 0) << "of a tiny file, only what is counted one by one shows";
-    EXPECT_EQ(kept_, test::ReadFile(file_)) << "the old file is only read";
-    old.reset();
-    ReplaceByUpgraded(file_);
-    EXPECT_EQ(test::ReadFile(file_)[20], kChecksumBytes);
-    SqliteStore store(file_, false, NoPaths());
-    EXPECT_EQ(before, Answers(store));
-    std::string listed;
-    const auto list = [&listed](const Json::Value& entry) {
-      listed += entry["KOVAMDPath"].asString() + "|";
-      EXPECT_EQ(entry["KOVAMDPath"].asString(),
-                entry["KOVAMDParent"].asString() + "/" + entry["KOVAMDFSName"].asString());
-    };
-    store.Get({"", "/v/", "", -1, {}}, list);
-    EXPECT_EQ(listed,
-              "/v/other/deep/er/x.txt|/v/photo|/v/photo-list.txt|/v/photo/2023|/v/photo/2023/b|"
-              "/v/photo/2023/harbour.txt|/v/photo/notes.txt|");
-    listed.clear();
-    GetRequest suspects;
-    suspects.suspects = true;
-    store.Get(suspects, list);
-    EXPECT_EQ(listed, "/v/photo/2023/harbour.txt|") << "the file's other name has changed";
-    const StoreStat stat = store.Stat();
-    EXPECT_EQ(stat.extract_error_examples.at("not text"), std::vector<std::string>{"/v/photo/notes.txt"});
-    EXPECT_EQ(stat.without_access, 7);
-    EXPECT_TRUE(stat.preparing);
-    store.EndPreparing();
-    store.Delete("/v/photo/2023/harbour.txt");
-    Json::Value moved;
-    moved["KOVAMDPath"] = "/v/pictures";
-    store.MoveFolder("/v/photo", "", moved);
-    store.Commit();
-    EXPECT_EQ(FindPaths(store, "boats path:/v/pictures"), "/v/pictures/2023/b\n/v/pictures/notes.txt");
-    EXPECT_EQ(FindPaths(store, "harbour"), "") << "its words could be taken out";
-    EXPECT_FALSE(store.Stat().preparing || store.Preparing()) << "the index daemon has said so";
-  }
+TEST_F(UpgradeTest, AFileOfFormat2AnswersAsBefore) {
+  UpgradeOptions options;
+  options.turn_bytes = 1;
+  int64_t last = 0;
+  options.on_turn = [&last](int64_t done, int64_t /*of*/) { last = done; };
+  auto old = std::make_unique<IndexUpgrade>(file_, NoPaths());
+  const std::string before = Answers(*old);
+  EXPECT_NE(before.find("harbour"), std::string::npos);
+  WriteUpgraded(file_, NoPaths(), options);
+  EXPECT_EQ(last, 7);
+  EXPECT_EQ(kept_, test::ReadFile(file_)) << "the old file is only read";
+  old.reset();
+  ReplaceByUpgraded(file_);
+  EXPECT_EQ(test::ReadFile(file_)[20], kChecksumBytes);
+  SqliteStore store(file_, false, NoPaths());
+  EXPECT_EQ(before, Answers(store));
+  std::string listed;
+  const auto list = [&listed](const Json::Value& entry) {
+    listed += entry["KOVAMDPath"].asString() + "|";
+    EXPECT_EQ(entry["KOVAMDPath"].asString(),
+              entry["KOVAMDParent"].asString() + "/" + entry["KOVAMDFSName"].asString());
+  };
+  store.Get({"", "/v/", "", -1, {}}, list);
+  EXPECT_EQ(listed,
+            "/v/other/deep/er/x.txt|/v/photo|/v/photo-list.txt|/v/photo/2023|/v/photo/2023/b|"
+            "/v/photo/2023/harbour.txt|/v/photo/notes.txt|");
+  listed.clear();
+  GetRequest suspects;
+  suspects.suspects = true;
+  store.Get(suspects, list);
+  EXPECT_EQ(listed, "/v/photo/2023/harbour.txt|") << "the file's other name has changed";
+  const StoreStat stat = store.Stat();
+  EXPECT_EQ(stat.extract_error_examples.at("not text"), std::vector<std::string>{"/v/photo/notes.txt"});
+  EXPECT_EQ(stat.without_access, 7);
+  EXPECT_TRUE(stat.preparing);
+  store.EndPreparing();
+  store.Delete("/v/photo/2023/harbour.txt");
+  Json::Value moved;
+  moved["KOVAMDPath"] = "/v/pictures";
+  store.MoveFolder("/v/photo", "", moved);
+  store.Commit();
+  EXPECT_EQ(FindPaths(store, "boats path:/v/pictures"), "/v/pictures/2023/b\n/v/pictures/notes.txt");
+  EXPECT_EQ(FindPaths(store, "harbour"), "") << "its words could be taken out";
+  EXPECT_FALSE(store.Stat().preparing || store.Preparing()) << "the index daemon has said so";
 }
 
-TEST_F(UpgradeTest, AFileFromBeforeAccessRecordsTakesThem) {
-  const std::string file = folder_ / "3.sqlite";
-  {
-    SqliteStore store(file, true, NoPaths());
-    store.Upsert("/v/a", FileDocument("/v/a"));
-    store.Commit();
-  }
-  {
-    Database database(file, Database::Mode::kWrite);
-    for (const char* table : {"docs", "folders"})
-      database.Execute("ALTER TABLE " + std::string(table) + " DROP COLUMN access");
-    database.Execute("DROP TABLE access; DELETE FROM info WHERE key IN ('without_access', 'preparing')");
-  }
-  for (const int64_t without : {1, 0}) {
-    SqliteStore store(file, false, NoPaths());
-    EXPECT_EQ(store.Stat().without_access, without);
-    EXPECT_EQ(store.Preparing(), without > 0);
-    EXPECT_EQ(store.SetAccess({{"/v/a", "1.1.1.1", "0:0:0644"}}).differing.size(), 1U) << "it has no stamp";
+TEST_F(UpgradeTest, AFileOfFormat3WithAccessRecordsAndFromBeforeThemGetsStems) {
+  for (const bool has_access : {true, false}) {
+    SCOPED_TRACE(has_access);
+    test::WriteFile(file_, Unpacked("index_format_3.sqlite.zst"));
+    if (!has_access) {
+      Database database(file_, Database::Mode::kWrite);
+      for (const char* table : {"docs", "folders"})
+        database.Execute("ALTER TABLE " + std::string(table) + " DROP COLUMN access");
+      database.Execute("DROP TABLE access; DELETE FROM info WHERE key IN ('without_access', 'preparing')");
+    }
+    EXPECT_NE(Answers(*std::make_unique<IndexUpgrade>(file_, PlainSchema())).find("/v/en.txt"), std::string::npos);
+    WriteUpgraded(file_, PlainSchema(), {});
+    ReplaceByUpgraded(file_);
+    SqliteStore store(file_, false, PlainSchema());
+    EXPECT_EQ(store.Stat().without_access, has_access ? 0 : 3);
+    EXPECT_EQ(store.Preparing(), !has_access);
+    EXPECT_EQ(Find(store, "boats").hits.front().title, "Harbours of the north");
+    EXPECT_EQ(FindPaths(store, "title:north"), "/v/en.txt");
+    const std::string terms = TermsIn(file_, "content_fts") + TermsIn(file_, "meta_fts");
+    for (const char* stem : {"\x04rechnung ", "\x04" "boat ", "\x04photo "})
+      EXPECT_NE(terms.find(stem), std::string::npos) << stem;
+    EXPECT_EQ(store.SetAccess({{"/v/en.txt", "1.1.1.1", "0:0:0644"}}).differing.size(), 1U) << "it has no stamp";
     store.Commit();
   }
 }

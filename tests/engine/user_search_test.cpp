@@ -101,7 +101,7 @@ TEST_F(UserSearchTest, AnswersAreOfTheUserWhoeverSendsThem) {
   const Json::Value found = Search()["data"];
   EXPECT_EQ(found.getMemberNames(), (std::vector<std::string>{"hits", "left_out", "next_offset", "total"}));
   EXPECT_EQ(found["hits"][0].getMemberNames(),
-            (std::vector<std::string>{"doc_id", "fields", "score", "share", "snippet"}));
+            (std::vector<std::string>{"doc_id", "fields", "score", "share", "snippet", "title"}));
   for (const std::string& name : found["hits"][0]["fields"].getMemberNames()) EXPECT_EQ(name.rfind("KOVAMD", 0), 0U);
 }
 

@@ -7,7 +7,7 @@ system=$(mktemp -d)
 chmod 755 "$system"  # its "/", which all users enter
 trap 'rm -rf "$system"' EXIT
 
-libraries=libjsoncpp25,libsqlite3-0,libzstd1,libuchardet0,libseccomp2,libmagic1,libzip4,libarchive13,libtag1v5-vanilla
+libraries=libjsoncpp25,libsqlite3-0,libzstd1,libstemmer0d,libcld2-0,libuchardet0,libseccomp2,libmagic1,libzip4,libarchive13,libtag1v5-vanilla
 libraries+=,libgmime-3.0-0,libpoppler-cpp0v5,libexiv2-27,libmediainfo0v5
 debootstrap --variant=minbase --include="systemd,systemd-sysv,$libraries" bookworm \
   "$system" >"$build/systemd-image.log"

@@ -194,6 +194,10 @@ void QueryEvaluator::CollectWords(const QueryNode& node, HitCollector& content, 
         in_content = true;
         continue;
       }
+      if (name == field::kTitle) {  // and the title that the text has
+        AppendOr(meta_expression, "{title} : " + phrase);
+        continue;
+      }
       std::vector<std::string> marked = words.words;
       for (std::string& word : marked) word.insert(0, name + kFieldEnd);
       AppendOr(meta_expression, "{fields} : " + PhraseExpression(marked, words.prefix));

@@ -34,6 +34,8 @@ SearchHit Searcher::LoadHit(const RankedDocument& ranked, const FoundWords& word
   hit.is_folder = stored->row.kind == kFolder;
   hit.stamp = TextField(stored->row.packed, reader_.names.NumberOf(FileLinks::kStamp)).value_or("");
   hit.fields = UnpackDocument(stored->row, reader_.names, {});
+  hit.title = stored->row.title;
+  if (hit.title.empty()) hit.title = TextField(stored->row.packed, reader_.names.NumberOf(field::kTitle)).value_or("");
   if (!request_.snippet || words.marked.empty() || stored->text_bytes == 0) return hit;
   Statement body = reader_.database.Prepare("SELECT zstd FROM bodies WHERE id = ?1");
   if (body.Bind(1, ranked.id).Step()) {

@@ -126,7 +126,7 @@ void Catalogue::GiveFolder(const std::string& path, int64_t access) {
 
 int64_t Catalogue::Insert(const DocRow& row, int64_t text_bytes) {
   Statement statement =
-      database_.Prepare("INSERT INTO docs VALUES(?1, ?2, ?3, ?4, ?5, ?6, ?7, ?8, ?9, ?10, ?11, ?12, ?13)");
+      database_.Prepare("INSERT INTO docs VALUES(?1, ?2, ?3, ?4, ?5, ?6, ?7, ?8, ?9, ?10, ?11, ?12, ?13, ?14, ?15)");
   const int64_t id = ++totals_.last_id;
   statement.Bind(1, id);
   BindRow(statement, tree_.Make(FolderTree::FolderOf(row.path)), row, text_bytes);
@@ -142,7 +142,7 @@ void Catalogue::Update(const StoredDocument& before, const DocRow& row, int64_t 
   const int64_t folder = tree_.Make(FolderTree::FolderOf(row.path));
   Statement statement = database_.Prepare(
       "UPDATE docs SET folder = ?2, leaf = ?3, name = ?4, ext = ?5, kind = ?6, size = ?7, mtime = ?8, text_bytes = ?9,"
-      " derived = ?10, error = ?11, packed = ?12, access = ?13 WHERE id = ?1");
+      " derived = ?10, error = ?11, packed = ?12, access = ?13, language = ?14, title = ?15 WHERE id = ?1");
   statement.Bind(1, before.id);
   BindRow(statement, folder, row, text_bytes);
   statement.Run();

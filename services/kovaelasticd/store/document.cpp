@@ -123,6 +123,12 @@ void AppendRangeWord(std::string& out, const std::string& name, const Json::Valu
 
 }  // namespace
 
+std::string ProseMark(Language language) { return {kProseMark, static_cast<char>('A' + static_cast<int>(language))}; }
+
+Language MarkedLanguage(std::string_view prose) {
+  return prose.size() < kProseMarkBytes ? Language::kNone : LanguageOfNumber(prose[1] - 'A');
+}
+
 std::string RangeWord(const std::string& field_name, int64_t number) {
   const auto limited = std::clamp<int64_t>(number, 0, static_cast<int64_t>(kRangedMax));
   char digits[32];  // 16 digits: the words' order, which is that of bytes, is then that of the numbers
@@ -202,19 +208,25 @@ Json::Value UnpackDocument(const DocRow& row, const FieldNames& names, const std
 
 MetaText MakeMetaText(const DocRow& row, const Json::Value& document, const Schema& schema) {
   MetaText meta;
+  meta.language = row.language;
   meta.grams = kGramsMark + row.name;
-  meta.name = " " + row.name;  // so that no name passes for one of the marks
+  meta.name = ProseMark(row.language) + row.name;
+  meta.title = ProseMark(row.language);
+  meta.text = ProseMark(row.language);
   meta.fields = kReadyMark;
+  bool has_title = false;
   for (auto member = document.begin(); member != document.end(); ++member) {
     const std::string name = member.name();
     if (name == field::kTitle) {
       AppendTexts(meta.title, *member);
+      has_title = *member == row.title;
     } else if (schema.IsPlain(name)) {
       AppendTexts(meta.text, *member);
     }
-    if (Schema::IsSearchable(name)) AppendFieldWords(meta.fields, name, *member);
+    if (Schema::IsSearchable(name) && name != field::kTitle) AppendFieldWords(meta.fields, name, *member);
     if (Schema::IsRanged(name)) AppendRangeWord(meta.fields, name, *member);
   }
+  if (!has_title) meta.title += row.title;
   if (row.kind == kFolder) AppendFolderNameWords(meta.fields, Basename(row.path));
   return meta;
 }

@@ -2,9 +2,11 @@
 
 #include <algorithm>
 #include <cstring>
+#include <new>
 #include <string_view>
 
 #include "services/kovaelasticd/store/document.h"
+#include "services/kovaelasticd/text/stems.h"
 #include "services/kovaelasticd/text/words.h"
 
 namespace ferrox::engine {
@@ -13,8 +15,8 @@ namespace {
 
 // SQLite's FTS5 keeps the words; cutting text into words and counting hits is done here, by two extensions: the
 // tokenizer "kova" and the function kova_collect. A table is given three kinds of text, told apart by their first byte
-// (document.h): prose, which WordScanner cuts; a name, of which all groups of three characters are indexed; and ready
-// words. Queries are made of ready words, each quoted, so that none is taken for an operator.
+// (document.h): prose, which WordScanner cuts and Stemmer stems; a name, of which all groups of three characters are
+// indexed; and ready words. Queries are made of ready words, each quoted, so that none is taken for an operator.
 
 /// By this name sqlite3_value_pointer makes sure that the function is called by Collect and by no query of others.
 constexpr char kCollectorType[] = "HitCollector";
@@ -28,9 +30,10 @@ using TokenSink = int (*)(void*, int, const char*, int, int, int);
 class TokenOutput {
  public:
   TokenOutput(void* context, TokenSink sink) : context_(context), sink_(sink) {}
-  bool Put(std::string_view word, size_t begin, size_t end) {
-    result_ =
-        sink_(context_, 0, word.data(), static_cast<int>(word.size()), static_cast<int>(begin), static_cast<int>(end));
+  /// `flags`: FTS5_TOKEN_COLOCATED for a word at the place of the one before.
+  bool Put(std::string_view word, size_t begin, size_t end, int flags = 0) {
+    result_ = sink_(context_, flags, word.data(), static_cast<int>(word.size()), static_cast<int>(begin),
+                    static_cast<int>(end));
     return result_ == SQLITE_OK;
   }
   int Result() const { return result_; }
@@ -55,35 +58,45 @@ void PutReadyWords(TokenOutput& output, std::string_view text) {
   }
 }
 
-void PutWords(TokenOutput& output, std::string_view text) {
+/// Words, each with its stem at the same place where that is another.
+void PutProse(TokenOutput& output, Stemmer& stemmer, Language language, std::string_view text) {
   WordScanner scanner(text);
   while (scanner.Next() && output.Put(scanner.Word(), scanner.Begin(), scanner.End())) {
+    if (language == Language::kNone || scanner.WordKind() != WordScanner::Kind::kWord) continue;
+    const std::string_view stem = stemmer.MarkedStem(language, scanner.Word());
+    if (stem.empty() || stem.substr(1) == scanner.Word()) continue;
+    if (!output.Put(stem, scanner.Begin(), scanner.End(), FTS5_TOKEN_COLOCATED)) return;
   }
 }
 
-int Tokenize(Fts5Tokenizer* /*tokenizer*/, void* context, int flags, const char* text, int size, TokenSink sink) {
+int Tokenize(Fts5Tokenizer* tokenizer, void* context, int flags, const char* text, int size, TokenSink sink) {
   const std::string_view all(text == nullptr ? "" : text, static_cast<size_t>(size));
   TokenOutput output(context, sink);
   if ((flags & FTS5_TOKENIZE_QUERY) != 0) {
     (void)output.Put(all, 0, all.size());  // expressions are built from ready words
-  } else if (!all.empty() && all.front() == kGramsMark) {
+  } else if (all.starts_with(kGramsMark)) {
     PutGrams(output, all.substr(1));
-  } else if (!all.empty() && all.front() == kReadyMark) {
+  } else if (all.starts_with(kReadyMark)) {
     PutReadyWords(output, all.substr(1));
-  } else {
-    PutWords(output, all);
+  } else if (all.starts_with(kProseMark)) {
+    try {
+      PutProse(output, *reinterpret_cast<Stemmer*>(tokenizer), MarkedLanguage(all),
+               all.substr(std::min(all.size(), kProseMarkBytes)));
+    } catch (const std::bad_alloc&) {
+      return SQLITE_NOMEM;
+    }
   }
   return output.Result();
 }
 
-/// The tokenizer has no state, but FTS5 wants an object.
+/// FTS5 makes one for each full-text table of a connection, and uses it in the connection's thread.
 int CreateTokenizer(void* /*context*/, const char** /*arguments*/, int /*count*/, Fts5Tokenizer** tokenizer) {
-  static char stateless;
-  *tokenizer = reinterpret_cast<Fts5Tokenizer*>(&stateless);
-  return SQLITE_OK;
+  auto* stemmer = new (std::nothrow) Stemmer;
+  *tokenizer = reinterpret_cast<Fts5Tokenizer*>(stemmer);
+  return stemmer == nullptr ? SQLITE_NOMEM : SQLITE_OK;
 }
 
-void DeleteTokenizer(Fts5Tokenizer* /*tokenizer*/) {}
+void DeleteTokenizer(Fts5Tokenizer* tokenizer) { delete reinterpret_cast<Stemmer*>(tokenizer); }
 
 /// By MetaColumn.
 uint8_t PlaceOfColumn(int column) {

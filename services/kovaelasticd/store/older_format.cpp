@@ -6,13 +6,21 @@
 namespace ferrox::engine {
 
 bool PrepareOlderFormat(Database& database) {
-  if (database.QueryInt("PRAGMA user_version") >= kTreeFormat) return false;
-  database.Execute(
-      "CREATE TEMP VIEW docs AS SELECT id, 1 AS folder, substr(path, 2) AS leaf, name, ext, kind, size, mtime,"
-      " text_bytes, derived, error, packed, 0 AS access FROM main.docs");
-  database.Execute("CREATE TEMP TABLE folders(id INTEGER PRIMARY KEY, parent INTEGER, name TEXT, access INTEGER)");
-  database.Execute("INSERT INTO temp.folders VALUES(1, 0, '/', 0)");
-  return true;
+  const int64_t format = database.QueryInt("PRAGMA user_version");
+  if (format >= kStoreFormat) return false;
+  const bool is_flat = format < kTreeFormat;
+  const bool has_access = database.QueryInt("SELECT count(*) FROM main.sqlite_master WHERE name = 'access'") != 0;
+  database.Execute("CREATE TEMP VIEW docs AS SELECT id, " +
+                   std::string(is_flat ? "1 AS folder, substr(path, 2) AS leaf" : "folder, leaf") +
+                   ", name, ext, kind, size, mtime, text_bytes, derived, error, packed, " +
+                   (has_access ? "access" : "0 AS access") + ", 0 AS language, '' AS title FROM main.docs");
+  if (is_flat) {
+    database.Execute("CREATE TEMP TABLE folders(id INTEGER PRIMARY KEY, parent INTEGER, name TEXT, access INTEGER)");
+    database.Execute("INSERT INTO temp.folders VALUES(1, 0, '/', 0)");
+  } else if (!has_access) {
+    database.Execute("CREATE TEMP VIEW folders AS SELECT id, parent, name, 0 AS access FROM main.folders");
+  }
+  return is_flat;
 }
 
 DocSet DocumentsAtWholePath(Database& database, const std::string& path) {

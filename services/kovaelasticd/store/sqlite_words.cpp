@@ -12,6 +12,8 @@ namespace {
 constexpr int64_t kPendingMaxBytes = 16 << 20;
 constexpr int64_t kPendingNewMaxBytes = 2 << 20;
 
+const std::string kNoText;
+
 std::optional<std::string> TextOrNone(std::string_view text) {
   return text.empty() ? std::nullopt : std::optional<std::string>(text);
 }
@@ -75,7 +77,7 @@ std::string SqliteWords::StoredText(int64_t id) {
 
 void SqliteWords::Flush() {
   for (const auto& [id, pending] : pending_) {
-    if (pending.text_changed) WriteText(id, pending);
+    if (pending.ChangesContent()) WriteText(id, pending);
   }
   for (const auto& [id, pending] : pending_) WriteMeta(id, pending);
   if (!pending_.empty()) last_written_ = pending_.rbegin()->first;
@@ -105,21 +107,27 @@ void SqliteWords::RemovePurged(int64_t id) { database_.Prepare("DELETE FROM bodi
 
 /// The old text is in "bodies" still, which is what the full-text table was given.
 void SqliteWords::WriteText(int64_t id, const Pending& pending) {
-  if (pending.old_meta.has_value()) {
-    const std::string before = StoredText(id);
-    if (before == pending.text.value_or("")) return;
-    if (!before.empty()) {
-      Statement remove =
-          database_.Prepare("INSERT INTO content_fts(content_fts, rowid, body) VALUES('delete', ?1, ?2)");
-      remove.Bind(1, id).Bind(2, std::string_view(before)).Run();
-      database_.Prepare("DELETE FROM bodies WHERE id = ?1").Bind(1, id).Run();
-    }
-  }
-  if (!pending.text.has_value()) return;
-  Statement insert = database_.Prepare("INSERT INTO content_fts(rowid, body) VALUES(?1, ?2)");
-  insert.Bind(1, id).Bind(2, std::string_view(*pending.text)).Run();
+  const std::string before = pending.old_meta.has_value() ? StoredText(id) : "";
+  const std::string& text = pending.text_changed ? (pending.text.has_value() ? *pending.text : kNoText) : before;
+  const bool same_language = pending.old_meta.has_value() && pending.new_meta.has_value() &&
+                             pending.old_meta->language == pending.new_meta->language;
+  if (before == text && same_language) return;
+  if (!before.empty()) InsertText(id, pending.old_meta->language, before, true);
+  if (!before.empty() && before != text) RemovePurged(id);
+  if (text.empty()) return;
+  InsertText(id, pending.new_meta->language, text, false);
+  if (before == text) return;
   Statement store = database_.Prepare("INSERT INTO bodies(id, zstd) VALUES(?1, ?2)");
-  store.Bind(1, id).BindBlob(2, codec_.Pack(*pending.text)).Run();
+  store.Bind(1, id).BindBlob(2, codec_.Pack(text)).Run();
+}
+
+/// Adds words to the full-text table, or removes them: both are insertions, the latter with the command 'delete'.
+void SqliteWords::InsertText(int64_t id, Language language, std::string_view text, bool remove) {
+  const std::string prose = ProseMark(language).append(text);
+  Statement statement =
+      database_.Prepare(remove ? "INSERT INTO content_fts(content_fts, rowid, body) VALUES('delete', ?1, ?2)"
+                               : "INSERT INTO content_fts(rowid, body) VALUES(?1, ?2)");
+  statement.Bind(1, id).Bind(2, std::string_view(prose)).Run();
 }
 
 void SqliteWords::WriteMeta(int64_t id, const Pending& pending) {
@@ -128,7 +136,7 @@ void SqliteWords::WriteMeta(int64_t id, const Pending& pending) {
   if (pending.new_meta.has_value()) InsertMeta(id, *pending.new_meta, false);
 }
 
-/// Adds words to the full-text table, or removes them: both are insertions, the latter with the command 'delete'.
+/// Likewise.
 void SqliteWords::InsertMeta(int64_t id, const MetaText& meta, bool remove) {
   Statement statement = database_.Prepare(
       remove ? "INSERT INTO meta_fts(meta_fts, rowid, grams, name, title, text, fields)"

@@ -48,9 +48,14 @@ class SqliteWords : public Words {
     std::optional<MetaText> new_meta;  ///< none: the document is removed
     bool text_changed = false;
     std::optional<std::string> text;  ///< none: it has no text; counts when text_changed
+    /// Words of the text, too, since their stems are those of its language.
+    bool ChangesContent() const {
+      return text_changed || (old_meta.has_value() && old_meta->language != new_meta->language);
+    }
   };
   Pending& PendingOf(const StoredDocument& stored);
   void WriteText(int64_t id, const Pending& pending);
+  void InsertText(int64_t id, Language language, std::string_view text, bool remove);
   void WriteMeta(int64_t id, const Pending& pending);
   void InsertMeta(int64_t id, const MetaText& meta, bool remove);
   std::string StoredText(int64_t id);

@@ -4,6 +4,8 @@
 #include "common/file_util.h"
 #include "services/kovaelasticd/store/path_walk.h"
 #include "services/kovaelasticd/store/sqlite_store.h"
+#include "services/kovaelasticd/text/language.h"
+#include "services/kovaelasticd/text/title.h"
 
 namespace ferrox::engine {
 
@@ -22,12 +24,6 @@ std::string_view TextOf(const Json::Value& document) {
   return {begin, static_cast<size_t>(end - begin)};
 }
 
-/// The tokenizer would take a text that begins with one of its marks for one that is cut into words already.
-std::string_view WithoutMarks(std::string_view text) {
-  while (!text.empty() && (text.front() == kGramsMark || text.front() == kReadyMark)) text.remove_prefix(1);
-  return text;
-}
-
 }  // namespace
 
 void SqliteStore::Changed(int64_t bytes) {
@@ -39,9 +35,11 @@ void SqliteStore::Changed(int64_t bytes) {
 void SqliteStore::Upsert(const std::string& path, const Json::Value& document) {
   catalogue_.Begin();
   AddFieldNames(catalogue_.Connection(), catalogue_.Names(), document);
-  const std::string_view text = WithoutMarks(TextOf(document));
+  const std::string_view text = TextOf(document);
   DocRow row = PackDocument(path, document, catalogue_.Names());
   row.access = catalogue_.Access().NumberOf(document[field::kAccess]);
+  row.language = LanguageOf(document, text);
+  row.title = TitleOf(text, row.ext);
   const auto text_bytes = static_cast<int64_t>(text.size());
   const std::optional<StoredDocument> before = catalogue_.Find(path);
   MetaText meta = MakeMetaText(row, document, *schema_);
@@ -74,7 +72,11 @@ void SqliteStore::Set(const std::string& path, const Json::Value& changes) {
   DocRow row = PackDocument(new_path, document, catalogue_.Names());
   row.access = access;
   const bool text_changed = changes.isMember(field::kTextContent);
-  const std::string_view text = WithoutMarks(TextOf(changes));
+  const std::string_view text = TextOf(changes);
+  row.title = text_changed ? TitleOf(text, row.ext) : before->row.title;
+  row.language = before->row.language;
+  if (text_changed || changes.isMember(field::kLanguages))
+    row.language = LanguageOf(document, text_changed ? text : std::string_view(words_.Text(before->id)));
   const int64_t text_bytes = text_changed ? static_cast<int64_t>(text.size()) : before->text_bytes;
   words_.Replace(*before, MakeMetaText(row, document, *schema_), text_changed ? std::optional(text) : std::nullopt);
   // A document that only moves says nothing new about its file.

@@ -26,7 +26,7 @@ constexpr const char* kDocumentTables[] = {
     ("CREATE TABLE docs(id INTEGER PRIMARY KEY, folder INTEGER NOT NULL, leaf TEXT NOT NULL,"
      " name TEXT NOT NULL COLLATE NOCASE, ext TEXT NOT NULL, kind INTEGER NOT NULL, size INTEGER, mtime INTEGER,"
      " text_bytes INTEGER NOT NULL, derived INTEGER NOT NULL, error TEXT, packed BLOB NOT NULL,"
-     " access INTEGER NOT NULL DEFAULT 0)"),
+     " access INTEGER NOT NULL DEFAULT 0, language INTEGER NOT NULL DEFAULT 0, title TEXT NOT NULL DEFAULT '')"),
     // Here, since folders that are made look for their own document.
     "CREATE UNIQUE INDEX docs_place ON docs(folder, leaf)",
 };
@@ -68,21 +68,6 @@ constexpr const char* kAccessTables[] = {
      " acl TEXT NOT NULL)"),
     "CREATE UNIQUE INDEX access_record ON access(uid, gid, mode, acl)",
 };
-
-/// Files of format 3 that were made before rights were recorded lack this: a table, and a column for its numbers, which
-/// are at the end of rows so that adding them rewrites none.
-void AddAccess(Database& database) {
-  if (database.QueryInt("SELECT count(*) FROM sqlite_master WHERE name = 'access'") != 0) return;
-  database.Execute("BEGIN IMMEDIATE");
-  for (const char* sql : kAccessTables) database.Execute(sql);
-  for (const char* table : {"docs", "folders"}) {
-    const std::string has =
-        "SELECT count(*) FROM pragma_table_info('" + std::string(table) + "') WHERE name = 'access'";
-    if (database.QueryInt(has.c_str()) != 0) continue;
-    database.Execute("ALTER TABLE " + std::string(table) + " ADD COLUMN access INTEGER NOT NULL DEFAULT 0");
-  }
-  database.Execute("COMMIT");
-}
 
 /// The format, kOldestFormat or more. A file that is refused is closed as it was opened: what its log holds stays
 /// there.
@@ -139,7 +124,7 @@ void PrepareStore(Database& database, bool create) {
   database.Execute("PRAGMA wal_autocheckpoint = " + std::to_string(kLogPages));
   database.Execute("PRAGMA journal_size_limit = 8388608");
   RegisterFullText(database);
-  if (!is_new) return AddAccess(database);
+  if (!is_new) return;
   database.Execute("BEGIN IMMEDIATE");
   MakeStoreTables(database);
   MakeStoreIndexes(database);

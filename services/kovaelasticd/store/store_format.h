@@ -10,9 +10,9 @@ namespace ferrox::engine {
 // The formats of index files, as PRAGMA user_version has them. Files from kOldestFormat on are upgraded (upgrade.h).
 inline constexpr int64_t kOldestFormat = 2;
 inline constexpr int64_t kTreeFormat = 3;  ///< the first whose documents lie in a tree of folders
-inline constexpr int64_t kStoreFormat = 3;
+inline constexpr int64_t kStoreFormat = 4;
 /// Since this format texts are cut into words as they are now, so that an upgrade can take the words over.
-inline constexpr int64_t kWordsFormat = 2;
+inline constexpr int64_t kWordsFormat = 4;
 
 // All throw Error kEngineStorage when the file is no index or has a format that this engine does not know; it is left
 // as it is then, with its log. IndexDamaged when it is damaged.

@@ -32,6 +32,8 @@ StoredDocument ReadRow(const Statement& statement, std::string_view folder_path)
   stored.row.error = statement.Text(10);
   stored.row.packed = statement.Text(11);
   stored.row.access = statement.Int(12);
+  stored.row.language = LanguageOfNumber(statement.Int(13));
+  stored.row.title = statement.Text(14);
   return stored;
 }
 
@@ -43,6 +45,7 @@ void BindRow(Statement& statement, int64_t folder, const DocRow& row, int64_t te
   statement.Bind(9, text_bytes).Bind(10, int64_t{row.derived});
   row.error.empty() ? statement.BindNull(11) : statement.Bind(11, std::string_view(row.error));
   statement.BindBlob(12, row.packed).Bind(13, row.access);
+  statement.Bind(14, static_cast<int64_t>(row.language)).Bind(15, std::string_view(row.title));
 }
 
 std::optional<StoredDocument> FindDocument(Database& database, FolderTree& tree, const std::string& path) {

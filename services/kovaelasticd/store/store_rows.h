@@ -37,10 +37,11 @@ struct Totals {
 
 /// Selects what ReadRow reads; a condition is to follow.
 inline constexpr char kSelectRow[] =
-    "SELECT id, folder, leaf, name, ext, kind, size, mtime, text_bytes, derived, error, packed, access FROM docs ";
+    "SELECT id, folder, leaf, name, ext, kind, size, mtime, text_bytes, derived, error, packed, access, language,"
+    " title FROM docs ";
 /// The row at hand; `folder_path` is that of its folder.
 StoredDocument ReadRow(const Statement& statement, std::string_view folder_path);
-/// Binds a row in `folder` to parameters 2 to 13, in the order of the table's columns. All that is bound must live
+/// Binds a row in `folder` to parameters 2 to 15, in the order of the table's columns. All that is bound must live
 /// until the statement has run.
 void BindRow(Statement& statement, int64_t folder, const DocRow& row, int64_t text_bytes);
 

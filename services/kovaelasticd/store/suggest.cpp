@@ -179,13 +179,14 @@ void RebuildSuggestions(Database& database) {
       "CREATE VIRTUAL TABLE IF NOT EXISTS temp.content_words USING fts5vocab('main', 'content_fts', 'row')");
   database.Execute("CREATE VIRTUAL TABLE IF NOT EXISTS temp.meta_words USING fts5vocab('main', 'meta_fts', 'col')");
   database.Execute("DELETE FROM suggestions");
-  // Words in the most documents, from names and titles too; a single occurrence is as likely an error itself.
+  // Words in the most documents, from names and titles too; a single occurrence is as likely an error itself. Digits
+  // and kStemMark, which stems begin with, are before ':'.
   database.Execute(
       "INSERT OR IGNORE INTO suggestions SELECT term, doc FROM temp.content_words"
-      " WHERE doc > 1 AND length(term) BETWEEN 4 AND 24 AND term NOT GLOB '[0-9]*' ORDER BY doc DESC LIMIT 50000");
+      " WHERE doc > 1 AND length(term) BETWEEN 4 AND 24 AND term >= ':' ORDER BY doc DESC LIMIT 50000");
   database.Execute(
       "INSERT OR IGNORE INTO suggestions SELECT term, doc FROM temp.meta_words WHERE col IN ('name', 'title')"
-      " AND length(term) BETWEEN 4 AND 24 AND term NOT GLOB '[0-9]*' ORDER BY doc DESC LIMIT 10000");
+      " AND length(term) BETWEEN 4 AND 24 AND term >= ':' ORDER BY doc DESC LIMIT 10000");
 }
 
 }  // namespace ferrox::engine

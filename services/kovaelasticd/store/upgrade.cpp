@@ -24,6 +24,8 @@
 #include "services/kovaelasticd/store/store_rows.h"
 #include "services/kovaelasticd/store/store_stat.h"
 #include "services/kovaelasticd/store/text_codec.h"
+#include "services/kovaelasticd/text/language.h"
+#include "services/kovaelasticd/text/title.h"
 
 namespace ferrox::engine {
 
@@ -31,16 +33,6 @@ namespace {
 
 /// What a row counts for besides its packed bytes.
 constexpr int64_t kRowOverhead = 100;
-
-/// Format 2 took the words of folders' names for words of each document, unless the mappings said otherwise.
-bool PathsWerePlain(const Json::Value& mappings) {
-  const Json::Value by_default = mappings.isObject() ? mappings["default"].get("_all", true) : Json::Value(true);
-  const auto is_plain = [&](const char* name) {
-    const Json::Value& field = mappings.isObject() ? mappings["properties"][name] : Json::Value::nullSingleton();
-    return field.isObject() ? field.get("_all", by_default) != false : by_default != false;
-  };
-  return is_plain(field::kPath) || is_plain(field::kParent);
-}
 
 /// Where the system does not say, writing shows it.
 bool HasSpaceFor(const std::string& path, int64_t bytes) {
@@ -75,8 +67,7 @@ class Upgrader {
   void Run() {
     options_.on_turn(0, of_);
     const bool has_tree = format_ >= kTreeFormat;
-    const bool cut_words =
-        options_.cut_words || format_ < kWordsFormat || (!has_tree && PathsWerePlain(schema_->Mappings()));
+    const bool cut_words = format_ < kWordsFormat;
     to_.Execute("BEGIN");
     if (!has_tree) PlaceDocuments();
     CopyTables([&](const std::string& table) {
@@ -146,7 +137,7 @@ class Upgrader {
     }
   }
 
-  /// Makes the words of all documents, and stores their texts, as if each were new.
+  /// Makes the words of all documents, and what else follows from their texts, as if each were new.
   void CutWords() {
     LoadFieldNames(to_, names_);
     tree_.Forget();
@@ -157,13 +148,19 @@ class Upgrader {
     static const std::string rows_sql = std::string(kSelectRow) + "ORDER BY id";
     Statement rows = to_.Prepare(rows_sql);
     Statement body = to_.Prepare("SELECT zstd FROM old.bodies WHERE id = ?1");
+    Statement learned = to_.Prepare("UPDATE main.docs SET language = ?2, title = ?3 WHERE id = ?1");
     while (rows.Step()) {
-      const StoredDocument stored = ReadRow(rows, tree_.PathOf(rows.Int(1)));
+      StoredDocument stored = ReadRow(rows, tree_.PathOf(rows.Int(1)));
       std::string text;
       if (stored.text_bytes > 0 && body.Bind(1, stored.id).Step()) text = codec.Unpack(body.Text(0));
       body.Reset();
       if (static_cast<int64_t>(text.size()) != stored.text_bytes) to_.Fail(SQLITE_CORRUPT);
-      words.Add(stored.id, MakeMetaText(stored.row, UnpackDocument(stored.row, names_, {}), *schema_), text);
+      const Json::Value document = UnpackDocument(stored.row, names_, {});
+      stored.row.language = LanguageOf(document, text);
+      stored.row.title = TitleOf(text, stored.row.ext);
+      learned.Bind(1, stored.id).Bind(2, static_cast<int64_t>(stored.row.language));
+      learned.Bind(3, std::string_view(stored.row.title)).Run();
+      words.Add(stored.id, MakeMetaText(stored.row, document, *schema_), text);
       words.Changed(stored.text_bytes);
       ++done_;
       Count(stored.text_bytes);

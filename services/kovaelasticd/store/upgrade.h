@@ -14,8 +14,6 @@ namespace ferrox::engine {
 /// (older_format.h), and a kill at any moment leaves either file whole; an unfinished new one is begun anew. Documents
 /// keep their numbers. No file of a share is read: what an older format lacks is made from stored documents and texts.
 struct UpgradeOptions {
-  /// Cuts all texts into words again, as is done anyway where the old file's words are not those of today.
-  bool cut_words = false;
   int64_t turn_bytes = 8 << 20;  ///< of what is read, between two calls of `on_turn`
   int64_t pages_max = 0;         ///< of the new file, for tests of a full volume; 0: no limit
   /// How far it is, in documents. What it throws ends the upgrade.

@@ -25,6 +25,7 @@ inline constexpr auto& kSize = fileindex::elastic::kKOVAMDFSSize;
 inline constexpr auto& kContentChangeDate = fileindex::elastic::kKOVAMDFSContentChangeDate;
 inline constexpr auto& kTextContent = fileindex::elastic::kKOVAMDTextContent;
 inline constexpr auto& kTitle = fileindex::elastic::kKOVAMDTitle;
+inline constexpr auto& kLanguages = fileindex::elastic::kKOVAMDLanguages;
 inline constexpr auto& kAccess = fileindex::elastic::k_KOVAAccess;
 inline constexpr auto& kExtractError = fileindex::elastic::k_KOVAExtractError;
 }  // namespace field
