@@ -28,7 +28,8 @@ class FolderWordsTest : public testing::Test {
     HiddenDocuments hidden;
     PlacesCache places;
     ReadableCache readable;
-    StoreReader reader(file_, hidden, places, readable);
+    WordListCache known;
+    StoreReader reader(file_, hidden, places, readable, known);
     reader.database.Execute("BEGIN");
     reader.Refresh();
     const Visible visible(reader, asker);

@@ -81,9 +81,9 @@ void SqliteStore::RebuildSuggestions() {
   uncommitted_bytes_ += 1;  // so that there is something to commit
 }
 
-/// The places that searches use, and the order of a listing that ended before its last page.
+/// What searches have in memory, and the order of a listing that ended before its last page.
 std::optional<std::chrono::steady_clock::time_point> SqliteStore::NextGiveBack() const {
-  const auto places = readers_.SharedPlaces().NextGiveBack();
+  const auto places = readers_.NextGiveBack();
   const auto listed = catalogue_.Listed().Used();
   if (!listed.has_value()) return places;
   const auto end = *listed + PlacesCache::kIdle;

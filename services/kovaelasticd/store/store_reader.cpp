@@ -1,5 +1,7 @@
 #include "services/kovaelasticd/store/store_reader.h"
 
+#include <algorithm>
+
 #include "services/kovaelasticd/store/fts.h"
 #include "services/kovaelasticd/store/store_rows.h"
 #include "services/kovaelasticd/store/work_limit.h"
@@ -14,10 +16,11 @@ constexpr size_t kIdleMax = 4;
 }  // namespace
 
 StoreReader::StoreReader(const std::string& path, HiddenDocuments& hidden_documents, PlacesCache& shared_places,
-                         ReadableCache& shared_readable)
+                         ReadableCache& shared_readable, WordListCache& shared_words)
     : database(path, Database::Mode::kRead),
       places(shared_places),
       readable(shared_readable),
+      words(shared_words),
       hidden_documents_(hidden_documents) {
   database.Execute("PRAGMA cache_size = -8192");
   RegisterFullText(database);
@@ -46,7 +49,7 @@ std::unique_ptr<StoreReader> ReaderPool::Borrow() {
       return reader;
     }
   }
-  auto reader = std::make_unique<StoreReader>(path_, hidden_documents_, places_, readable_);
+  auto reader = std::make_unique<StoreReader>(path_, hidden_documents_, places_, readable_, words_);
   WorkLimit::Apply(reader->database.Handle());
   return reader;
 }
@@ -56,7 +59,16 @@ void ReaderPool::Return(std::unique_ptr<StoreReader> reader) {
   if (idle_.size() < kIdleMax) idle_.push_back(std::move(reader));
 }
 
+std::optional<PlacesCache::SteadyClock::time_point> ReaderPool::NextGiveBack() const {
+  const auto places = places_.NextGiveBack();
+  const auto words = words_.Used();
+  if (!words.has_value()) return places;
+  const auto end = *words + PlacesCache::kIdle;
+  return places.has_value() ? std::min(*places, end) : end;
+}
+
 void ReaderPool::GiveBack(PlacesCache::SteadyClock::time_point now) {
+  if (const auto words = words_.Used(); words.has_value() && now >= *words + PlacesCache::kIdle) words_.GiveBack();
   places_.GiveBack(now);
   if (!places_.IsLoaded()) readable_.GiveBack();
 }

@@ -1,6 +1,7 @@
 #pragma once
 
 #include <memory>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -14,6 +15,7 @@
 #include "services/kovaelasticd/store/readable_cache.h"
 #include "services/kovaelasticd/store/sqlite_db.h"
 #include "services/kovaelasticd/store/text_codec.h"
+#include "services/kovaelasticd/store/word_list_cache.h"
 
 namespace ferrox::engine {
 
@@ -22,7 +24,7 @@ namespace ferrox::engine {
 struct StoreReader {
   /// What is shared with other readers, of the same file, must outlive this.
   StoreReader(const std::string& path, HiddenDocuments& hidden_documents, PlacesCache& shared_places,
-              ReadableCache& shared_readable);
+              ReadableCache& shared_readable, WordListCache& shared_words);
   /// To be called at the beginning of each transaction: learns what was committed since the last one.
   void Refresh();
 
@@ -32,8 +34,9 @@ struct StoreReader {
   TextCodec codec;
   /// Documents that are deleted but still in the tables; null when there are none.
   std::shared_ptr<const DocSet> hidden;
-  PlacesCache& places;  ///< of all readers of the index, as is the next
+  PlacesCache& places;  ///< of all readers of the index, as are the next two
   ReadableCache& readable;
+  WordListCache& words;
 
  private:
   HiddenDocuments& hidden_documents_;
@@ -52,8 +55,8 @@ class ReaderPool {
   std::unique_ptr<StoreReader> Borrow();
   /// Takes a connection back that has no transaction open. After a failure do not return it: it is closed then.
   void Return(std::unique_ptr<StoreReader> reader);
-  const PlacesCache& SharedPlaces() const { return places_; }
-  /// What PlacesCache says, for all that searches have in memory.
+  // What PlacesCache says, for all that searches have in memory.
+  std::optional<PlacesCache::SteadyClock::time_point> NextGiveBack() const;
   void GiveBack(PlacesCache::SteadyClock::time_point now);
 
  private:
@@ -61,6 +64,7 @@ class ReaderPool {
   HiddenDocuments hidden_documents_;
   PlacesCache places_;
   ReadableCache readable_;
+  WordListCache words_;
   base::Mutex mutex_;
   std::vector<std::unique_ptr<StoreReader>> idle_ BASE_GUARDED_BY(mutex_);
 };

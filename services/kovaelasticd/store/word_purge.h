@@ -6,6 +6,7 @@
 #include <vector>
 
 #include "services/kovaelasticd/store/doc_set.h"
+#include "services/kovaelasticd/store/fts_pages.h"
 #include "services/kovaelasticd/store/sqlite_db.h"
 
 namespace ferrox::engine {
@@ -25,33 +26,25 @@ class WordPurge {
  public:
   enum class Result { kMore, kDone, kUnknownFormat };
   /// `table` is the full-text table. `database` must outlive this.
-  WordPurge(Database& database, const std::string& table);
+  WordPurge(Database& database, const std::string& table) : pages_(database, table) {}
 
   /// Goes through at most `pages` pages, in the transaction that is open, and takes them from `pages`. `gone` must be
   /// the same for all turns. kUnknownFormat: it met what this class does not know; the table is as good as before.
   Result Turn(const DocSet& gone, int64_t& pages);
 
  private:
-  /// A sorted run of terms, on the pages from `first` to `last`. FTS5 gives numbers again: the first page tells whether
-  /// it is the same one.
-  struct Segment {
-    int64_t number;
-    int64_t first;
-    int64_t last;
+  /// The first page tells whether it is the same one.
+  struct Segment : FtsSegment {
     size_t first_page_hash;
     bool operator==(const Segment& other) const = default;
   };
 
   bool ReadSegments(std::vector<Segment>& segments);
-  std::string ReadPage(int64_t segment, int64_t page);
   bool RewritePages(Segment& segment, const DocSet& gone, int64_t& pages);
   bool Rewrite(std::string_view page, const DocSet& gone, std::string& out);
   bool CopyEntries(std::string_view list, bool is_last, bool keep_first, const DocSet& gone, std::string& out);
 
-  Database& database_;
-  const std::string version_;
-  const std::string select_;
-  const std::string update_;
+  FtsPages pages_;
   std::vector<Segment> done_;
   Segment current_ = {};     ///< the one that is gone through
   int64_t next_page_ = 0;    ///< of it
