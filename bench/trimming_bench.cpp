@@ -3,6 +3,8 @@
 // is closed to the users who ask. Measured is one query, of the rarest word, as somebody who may read everything and as
 // users: the first of all, the first of each user, those after it, and those after a commit that changes the rights of
 // a folder, or add a document: processor time of the searching thread.
+// At the end the same for a user who is not shown the names of one in ten documents and folders, and how long it takes
+// until all names are compared with such patterns.
 //   trimming_bench [--documents N] [--folder DIR]      DIR: the index is kept there, and used again by the next run
 #include <algorithm>
 #include <cstdio>
@@ -18,6 +20,7 @@
 #include <json/value.h>
 
 #include "services/kovaelasticd/query/query.h"
+#include "services/kovaelasticd/store/name_rules.h"
 #include "services/kovaelasticd/store/sqlite_store.h"
 
 namespace {
@@ -109,12 +112,13 @@ class Bench {
         "after a folder's rights", [this](size_t round) { Change(round, true); }, &user_);
     Measure(
         "  the same, of all", [this](size_t round) { Change(kRounds + round, true); }, nullptr);
+    MeasureNames();
   }
 
  private:
   static Asker User(size_t number) {
     const auto uid = static_cast<uint32_t>(50001 + number);
-    return {uid, {uid, 60000}, kTop};
+    return {uid, {uid, 60000}, kTop, ""};
   }
 
   void Open() {
@@ -142,6 +146,31 @@ class Bench {
     printf("%-26s %6.2f (%.2f), %d found\n", name, times[kRounds / 2], times.back(), static_cast<int>(found_));
   }
 
+  void MeasureNames() {
+    rules_ = ferrox::engine::NameRules::TextOf({"*3.txt", "f3", "~*", ".DS_Store", "*.part"}, false);
+    const double began = ThreadMs();
+    while (!store_->Obeys(rules_)) store_->ObeySome(rules_);
+    printf("all names compared in      %6.0f ms\n", ThreadMs() - began);
+    user_ = User(0);
+    user_.unseen_names = rules_;
+    Measure(
+        "names, just opened", [this](size_t) { Open(); }, &user_);
+    Measure(
+        "names, a user's first",
+        [this](size_t round) {
+          user_ = User(1 + round);
+          user_.unseen_names = rules_;
+        },
+        &user_);
+    Measure(
+        "names, later ones", [](size_t) {}, &user_);
+    Measure(
+        "names, after a document", [this](size_t round) { Change(2 * kRounds + round, false); }, &user_);
+    Measure(
+        "names, after rights", [this](size_t round) { Change(2 * kRounds + round, true); }, &user_);
+    while (!store_->Obeys("")) store_->ObeySome("");
+  }
+
   void Change(size_t round, bool rights) {
     const std::string folder = std::string(kTop) + "/f1";
     if (rights) {
@@ -157,6 +186,7 @@ class Bench {
   const size_t documents_;
   std::unique_ptr<SqliteStore> store_;
   Asker user_ = User(0);
+  std::string rules_;
   int64_t found_ = 0;
 };
 

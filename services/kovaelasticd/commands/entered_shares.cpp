@@ -27,7 +27,7 @@ std::optional<EnteredShare> EnterNamed(const CommandCall& call, Asker asker,
     return index.share != nullptr && index.share->share == name;
   };
   const auto found = std::find_if(listed.begin(), listed.end(), has_name);
-  asker.share_root = found == listed.end() ? "/" : found->share->root;
+  asker = AskerIn(call, std::move(asker), found == listed.end() ? ShareNote{"", "/", "", {}} : *found->share);
   const bool entered = CanEnter(call, asker, found == listed.end() ? nullptr : found->share.get());
   if (found == listed.end() || !entered) return std::nullopt;
   return EnteredShare{found->id, found->share, found->paused, std::move(asker)};
@@ -47,9 +47,15 @@ std::optional<std::vector<std::string>> ReadShareNames(const Json::Value& data) 
   return names;
 }
 
+Asker AskerIn(const CommandCall& call, Asker asker, const ShareNote& note) {
+  asker.share_root = note.root;
+  if (call.named != nullptr && note.names.has_value()) asker.unseen_names = note.names->unseen;
+  return asker;
+}
+
 bool IsLetIn(const CommandCall& call, const ShareNote* note, const wire::LiveFile& root) {
   if (!root.entered || note == nullptr) return false;
-  return call.named == nullptr || RulesLetIn(note->rules, *call.named);
+  return call.named == nullptr || (note->names.has_value() && RulesLetIn(note->rules, *call.named));
 }
 
 std::vector<EnteredShare> EnteredShares(const CommandCall& call, const Asker& asker,
@@ -66,8 +72,7 @@ std::vector<EnteredShare> EnteredShares(const CommandCall& call, const Asker& as
   }
   for (const Registry::Listed& index : listed) {
     if (index.share == nullptr) continue;
-    Asker here = asker;
-    here.share_root = index.share->root;
+    Asker here = AskerIn(call, asker, *index.share);
     if (CanEnter(call, here, index.share.get()))
       entered.push_back({index.id, index.share, index.paused, std::move(here)});
   }

@@ -17,7 +17,7 @@ struct EnteredShare {
   std::string index_id;
   ShareNotePtr note;
   bool paused;
-  Asker asker;  ///< with this share's root
+  Asker asker;  ///< AskerIn this share
 };
 
 /// The member "shares", each name once; nothing when it is absent. @throws Error kEngineBadRequest.
@@ -27,6 +27,10 @@ std::optional<std::vector<std::string>> ReadShareNames(const Json::Value& data);
 /// a program asks for a user by name. Everything that shows an asker anything of a share goes by this. `note` null:
 /// none.
 bool IsLetIn(const CommandCall& call, const ShareNote* note, const wire::LiveFile& root);
+
+/// The asker as one of this share's: with its root and, where a program asks for a user by name, with what its rules
+/// say of names.
+Asker AskerIn(const CommandCall& call, Asker asker, const ShareNote& note);
 
 /// The shares that the asker can enter now, those that are refused to ordinary users among them: of the `named` ones in
 /// their order, else of all in the order of their indices' ids.

@@ -87,6 +87,7 @@ Json::Value OnIndexShare(CommandCall& call) {
   note.refused = OptionalText(call.data, "refused").value_or("");
   if (!IsJsonObject(call.data["rules"])) RefuseMember("rules", "an object");
   note.rules = call.data["rules"];
+  note.ReadNames();
   call.registry.NoteShare(id, std::move(note));
   return {};
 }

@@ -96,6 +96,7 @@ std::string OwnState(const CommandCall& call, const EnteredShare& share, Json::V
       entry["percent"] = *percent;
       return "preparing";
     }
+    if (!share.asker.unseen_names.empty() && !open.index->Obeys(share.asker.unseen_names)) return "preparing";
     return open.rebuild.Since() != 0 ? "rebuilding" : "ready";
   } catch (const Error& error) {
     const bool for_user = !call.caller.privileged || !call.data["as"].isNull();

@@ -10,6 +10,7 @@
 #include "services/kovaelasticd/commands/members.h"
 #include "services/kovaelasticd/commands/user_error.h"
 #include "services/kovaelasticd/commands/user_search.h"
+#include "services/kovaelasticd/store/name_rules.h"
 #include "wire/fields.h"
 
 namespace ferrox::engine {
@@ -56,13 +57,20 @@ Json::Value LoadDocument(Index& index, const std::string& path, bool with_text) 
   return document;
 }
 
+/// By the share's rules, for users by name; `path` lies in the share. A name that is only hidden is shown to who knows
+/// it.
+bool IsVetoed(const ShareNote& note, const std::string& path) {
+  return !note.names.has_value() || NameRules(note.names->vetoed).MatchAnyIn(path.substr(note.root.size()));
+}
+
 /// The document, where the asker may see it: it has an access record, the share can be entered and searched, and the
 /// file on the disk is the one that was indexed, and can be read. The disk is looked at first, whatever is there.
 Json::Value ShowTo(const CommandCall& call, Asker asker, const Candidate& candidate, bool with_text) {
   const Registry::Listed& index = *candidate.index;
-  asker.share_root = index.share->root;
+  asker = AskerIn(call, std::move(asker), *index.share);
   const std::vector<wire::LiveFile> live = call.look(asker, {asker.share_root, candidate.path});
   if (live.size() != 2 || !IsLetIn(call, index.share.get(), live[0]) || !live[1].readable) return {};
+  if (call.named != nullptr && IsVetoed(*index.share, candidate.path)) return {};
   const EnteredShare share{index.id, index.share, index.paused, asker};
   const Json::Value document = LoadDocument(*OpenForUser(call, share).index, candidate.path, with_text);
   if (!document.isMember(field::kAccess) || !document[fileindex::elastic::k_KOVAStamp].isString()) return {};

@@ -23,8 +23,8 @@ namespace ferrox::engine {
 /// Changes of several callers share a transaction; a commit that several wait for is made once. What nobody commits is
 /// committed after a while, or after kAutoCommitBytes. When changes that were answered with success are lost (a full
 /// disk, or a process that died: a marker file beside the index tells), the next commit fails, so that the sender
-/// of the changes sends them again. While the thread has nothing else to do, it clears what is left of deleted folders,
-/// and has the scrubber look after the file.
+/// of the changes sends them again. While the thread has nothing else to do, it compares names with rules that have
+/// changed, clears what is left of deleted folders, and has the scrubber look after the file.
 ///
 /// An index whose file has an older format is upgraded first: until then it has no store, and only Search and Stat are
 /// answered, from the old file.
@@ -59,6 +59,11 @@ class Index {
   /// While documents of an index that came without access records are still to be given theirs: how many of a hundred
   /// have one, at most 99. Costs nothing otherwise.
   std::optional<int> PreparingPercent();
+  /// Which names the share does not show, a text of NameRules. The thread compares all names with them when they are
+  /// others than before; costs nothing otherwise.
+  void SetNameRules(const std::string& rules);
+  /// Whether askers with these rules can be answered.
+  bool Obeys(const std::string& rules);
   /// The number of changes that are not committed yet.
   int64_t Uncommitted() const { return uncommitted_; }
   /// Nothing when the index has the present format.
@@ -94,6 +99,7 @@ class Index {
   void DoOwnWork(bool busy);
   void PlanGiveBack();
   void Clear(bool busy);
+  void ObeyNames(bool busy);
   void Scrub();
   void LoseChanges();
   void Mark();
@@ -126,6 +132,8 @@ class Index {
   std::deque<Task*> tasks_ BASE_GUARDED_BY(mutex_);  ///< of callers that wait, in the order of their calls
   bool stopping_ BASE_GUARDED_BY(mutex_) = false;
   bool upgrading_ BASE_GUARDED_BY(mutex_) = false;  ///< there is no store yet
+  std::string name_rules_ BASE_GUARDED_BY(mutex_);
+  std::atomic<bool> compares_names_{false};  ///< the store does not obey them yet, as far as is known
 
   // Of the thread alone, except for reading the count and what is said otherwise.
   std::atomic<int64_t> uncommitted_{0};
@@ -134,6 +142,7 @@ class Index {
   bool lost_ = false;  ///< changes that were answered with success are gone, and no commit has failed for it yet
   std::chrono::steady_clock::time_point auto_commit_at_;  ///< while uncommitted_ is above 0
   std::chrono::steady_clock::time_point clear_at_;        ///< while documents are to be cleared
+  std::chrono::steady_clock::time_point obey_at_;         ///< while names are to be compared
 
   std::thread thread_;
 };

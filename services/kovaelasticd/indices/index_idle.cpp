@@ -13,12 +13,18 @@ using IdleClock = std::chrono::steady_clock;
 constexpr std::chrono::milliseconds kClearLatest{250};
 constexpr std::chrono::seconds kClearAgain{60};
 
+/// While tasks come all the time, a turn is done after kClearLatest all the same.
+bool IsTurn(IdleClock::time_point now, IdleClock::time_point planned, bool busy) {
+  return now >= (busy ? planned + kClearLatest : planned);
+}
+
 }  // namespace
 
-/// When the thread has something to do without a task: an automatic commit, or else a turn of clearing, or of the
-/// scrubber, or memory to give back.
+/// When the thread has something to do without a task: an automatic commit, or else a turn of comparing names, of
+/// clearing, or of the scrubber, or memory to give back.
 std::optional<IdleClock::time_point> Index::NextOwnWork() const {
   if (uncommitted_ > 0) return auto_commit_at_;
+  if (compares_names_) return obey_at_;
   if (store_->Uncleared() > 0) return clear_at_;
   const auto give_back = store_->NextGiveBack();
   if (scrubber_ == nullptr) return give_back;
@@ -31,7 +37,9 @@ void Index::DoOwnWork(bool busy) {
   store_->GiveBack(IdleClock::now());
   if (store_->NextGiveBack().has_value()) gives_back_ = true;
   if (uncommitted_ > 0) return;
-  if (store_->Uncleared() > 0) {
+  if (compares_names_) {
+    ObeyNames(busy);
+  } else if (store_->Uncleared() > 0) {
     Clear(busy);
   } else if (!busy && scrubber_ != nullptr) {
     Scrub();
@@ -47,10 +55,40 @@ void Index::PlanGiveBack() {
   wake_thread_.NotifyOne();
 }
 
-/// While tasks come all the time, a turn is done after kClearLatest all the same.
+void Index::SetNameRules(const std::string& rules) {
+  const base::MutexLock lock(mutex_);
+  if (name_rules_ == rules) return;
+  name_rules_ = rules;
+  compares_names_ = true;
+  wake_thread_.NotifyOne();
+}
+
+bool Index::Obeys(const std::string& rules) {
+  const base::MutexLock lock(mutex_);
+  return name_rules_ == rules && !compares_names_;
+}
+
+/// Ordinary users by name wait for this, so it goes before Clear, and is done as often.
+void Index::ObeyNames(bool busy) {
+  if (!IsTurn(IdleClock::now(), obey_at_, busy)) return;
+  std::string rules;
+  {
+    const base::MutexLock lock(mutex_);
+    rules = name_rules_;
+  }
+  try {
+    ReportingDamage([&] { store_->ObeySome(rules); });
+    obey_at_ = IdleClock::now();
+  } catch (const std::exception&) {
+    LoseChanges();  // logged where it arose
+    obey_at_ = IdleClock::now() + kClearAgain;
+  }
+  const base::MutexLock lock(mutex_);
+  compares_names_ = !store_->Obeys(name_rules_);
+}
+
 void Index::Clear(bool busy) {
-  const IdleClock::time_point now = IdleClock::now();
-  if (now < clear_at_ || (busy && now < clear_at_ + kClearLatest)) return;
+  if (!IsTurn(IdleClock::now(), clear_at_, busy)) return;
   try {
     ReportingDamage([&] { store_->ClearSome(); });
     clear_at_ = IdleClock::now();

@@ -23,6 +23,11 @@ bool NeedsHealing(const IndexRecord& record) {
   return *record.slot->damaged || record.rebuild.Unmade() || IsIndexFileLost(record.path);
 }
 
+/// What no asker by name is shown; "" where none is answered at all.
+std::string NameRulesOf(const ShareNotePtr& share) {
+  return share != nullptr && share->names.has_value() ? share->names->unseen : std::string();
+}
+
 }  // namespace
 
 Registry::Registry(const std::string& state_folder) : table_(state_folder + "/indices.json") {}
@@ -149,6 +154,10 @@ void Registry::NoteShare(const std::string& id, ShareNote note) {
   const ShareNotePtr known = table_.Find(id).share;
   if (known != nullptr && *known == note) return;
   table_.ApplyOrUndo(id, [&](IndexRecord& record) { record.share = std::make_shared<ShareNote>(std::move(note)); });
+  const IndexRecord record = table_.Find(id);
+  IndexSlot& slot = *record.slot;
+  const base::MutexLock opening(slot.mutex);
+  if (slot.index != nullptr) slot.index->SetNameRules(NameRulesOf(record.share));
 }
 
 void Registry::HealDamaged() {
@@ -255,6 +264,7 @@ Registry::OpenIndex Registry::Open(const std::string& id) {
   FERROX_FAIL_IF(still->paused, Error::kEngineIndexPaused, PausedIndex(id));
   OpenOrHeal(id, *still, *slot);
   const IndexRecord record = table_.Find(id);
+  slot->index->SetNameRules(NameRulesOf(record.share));
   return {id, slot->index, slot->schema, record.rebuild, record.share};
 }
 

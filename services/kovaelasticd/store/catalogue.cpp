@@ -28,6 +28,7 @@ Catalogue::Catalogue(const std::string& path, bool create) : database_(path, Ope
   links_.MakeTables();
   places_.MakeTable();
   places_.Forget();  // what an upgrade has changed is in there
+  name_marks_.Load();
   LoadFieldNames(database_, names_);
   totals_ = LoadTotals(database_);
   SyncIndexFolder(Dirname(path));
@@ -74,6 +75,7 @@ void Catalogue::Rollback() {
   access_.Forget();
   listed_.Forget();
   places_.Forget();
+  name_marks_.Load();
   names_ = FieldNames();
   LoadFieldNames(database_, names_);
   totals_ = LoadTotals(database_);

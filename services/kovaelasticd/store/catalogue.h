@@ -12,6 +12,7 @@
 #include "services/kovaelasticd/store/folder_tree.h"
 #include "services/kovaelasticd/store/index_store.h"
 #include "services/kovaelasticd/store/listed_documents.h"
+#include "services/kovaelasticd/store/name_marks.h"
 #include "services/kovaelasticd/store/place_writer.h"
 #include "services/kovaelasticd/store/row_watch.h"
 #include "services/kovaelasticd/store/sqlite_db.h"
@@ -63,6 +64,9 @@ class Catalogue {
   FolderTree& Tree() { return tree_; }
   AccessRecords& Access() { return access_; }
   FileLinks& Links() { return links_; }
+  /// Marks some names by `rules`, in the transaction that is open.
+  void MarkNames(const std::string& rules) { name_marks_.Turn(rules, totals_.version + 1); }
+  const NameMarks& Marks() const { return name_marks_; }
   ListedDocuments& Listed() { return listed_; }
   const ListedDocuments& Listed() const { return listed_; }
   /// The sums, with the changes of the open transaction.
@@ -83,6 +87,7 @@ class Catalogue {
   FileLinks links_{database_, tree_, names_};
   ListedDocuments listed_{database_, tree_};
   PlaceWriter places_{database_};
+  NameMarks name_marks_{database_, places_};
   RowWatch watch_{database_, [this](auto table, int64_t number, bool is_update) { OnRow(table, number, is_update); }};
   Totals totals_;
   bool in_transaction_ = false;  ///< since the first change after a commit

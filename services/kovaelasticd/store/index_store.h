@@ -194,6 +194,11 @@ class IndexStore {
   /// uncommitted. To be called until Uncleared is 0; what is left at the end of the process is there when the index is
   /// opened again.
   virtual void ClearSome() = 0;
+  /// Whether askers with `rules` (Asker::unseen_names) can be answered, as far as the last commit is concerned.
+  virtual bool Obeys(const std::string& rules) const = 0;
+  /// Compares some names with `rules`, in place of those before, as a transaction of its own of some 50 ms, and commits
+  /// it. No changes may be uncommitted. To be called until Obeys; it begins anew when the index is opened again.
+  virtual void ObeySome(const std::string& rules) = 0;
   /// When to call GiveBack next; nothing while there is nothing to give back. For any thread.
   virtual std::optional<std::chrono::steady_clock::time_point> NextGiveBack() const { return std::nullopt; }
   /// Frees memory that only saves time, if nobody has used it for some minutes before `now`.

@@ -13,17 +13,6 @@ constexpr auto kPlacesInPart = static_cast<int64_t>(PlaceList::kPart);
 /// From so many changed places of a part on, one pass over all of its rows is cheaper.
 constexpr int64_t kReadAllFrom = 64;
 
-/// Number, folder, access record, bytes of text, name.
-void PutRow(const Statement& row, int64_t first, PlaceList::Part& part) {
-  const auto at = static_cast<size_t>(row.Int(0) - first);
-  const int64_t access = row.Int(2);
-  Place& place = part.places[at];
-  place.folder = static_cast<uint32_t>(row.Int(1));
-  place.access = static_cast<uint32_t>(access > Place::kAccessMax ? 0 : access) & Place::kAccessMax;
-  place.length = LengthClass(row.Int(3));
-  part.names[at] = NameHash(row.Text(4));
-}
-
 }  // namespace
 
 const PlaceWriter::List PlaceWriter::kDocuments = {
@@ -34,9 +23,13 @@ const PlaceWriter::List PlaceWriter::kFolders = {
     "SELECT id, parent, access, 0, name FROM folders WHERE id BETWEEN ?1 AND ?2"};
 
 void PlaceWriter::MakeTable() {
+  // Of which patterns the marks are (NameMarks); places that are made anew have none.
+  database_.Execute(
+      "CREATE TABLE IF NOT EXISTS name_rules(id INTEGER PRIMARY KEY, rules TEXT NOT NULL, complete INTEGER NOT NULL)");
   if (database_.QueryInt("SELECT count(*) FROM sqlite_master WHERE name = 'locations'") != 0) return;
   database_.Execute("BEGIN IMMEDIATE");
   try {
+    database_.Execute("DELETE FROM name_rules WHERE id > 0");
     database_.Execute("DROP TABLE IF EXISTS places");  // the same with less in it, which files had before
     database_.Execute(
         "CREATE TABLE locations(part INTEGER PRIMARY KEY, version INTEGER NOT NULL, packed BLOB NOT NULL)");
@@ -106,6 +99,31 @@ void PlaceWriter::UpdatePart(const List& list, int64_t number, const int64_t* be
       "INSERT INTO locations(part, version, packed) VALUES(?1, ?2, ?3)"
       " ON CONFLICT(part) DO UPDATE SET version = excluded.version, packed = excluded.packed");
   write.Bind(1, key).Bind(2, version).BindBlob(3, packed).Run();
+}
+
+/// `row` has number, folder, access record, bytes of text, name; folders' names end with "/".
+void PlaceWriter::PutRow(const Statement& row, int64_t first, PlaceList::Part& part) const {
+  const auto at = static_cast<size_t>(row.Int(0) - first);
+  const int64_t access = row.Int(2);
+  std::string_view name = row.Text(4);
+  Place& place = part.places[at];
+  place.folder = static_cast<uint32_t>(row.Int(1));
+  place.access = static_cast<uint32_t>(access > Place::kAccessMax ? 0 : access) & Place::kAccessMax;
+  place.length = LengthClass(row.Int(3));
+  part.names[at] = NameHash(name);
+  if (name.ends_with('/')) name.remove_suffix(1);
+  place.unseen = name_rules_->Match(name) ? 1 : 0;
+}
+
+int64_t PlaceWriter::MarkPart(int64_t key, int64_t version) {
+  {
+    Statement next = database_.Prepare("SELECT min(part) FROM locations WHERE part >= ?1");
+    if (!next.Bind(1, key).Step() || next.IsNull(0)) return -1;
+    key = next.Int(0);
+  }
+  const List& list = key % 2 == kFolders.parity ? kFolders : kDocuments;
+  UpdatePart(list, key / 2, nullptr, nullptr, version);
+  return key + 1;
 }
 
 void PlaceWriter::Forget() {

@@ -1,8 +1,11 @@
 #pragma once
 
 #include <cstdint>
+#include <memory>
+#include <utility>
 #include <vector>
 
+#include "services/kovaelasticd/store/name_rules.h"
 #include "services/kovaelasticd/store/places.h"
 #include "services/kovaelasticd/store/row_watch.h"
 #include "services/kovaelasticd/store/sqlite_db.h"
@@ -26,6 +29,10 @@ class PlaceWriter {
   bool IsFull() const { return documents_.size() + folders_.size() >= kChangedMax; }
   /// Brings the table up to date; `version` is that of the next commit.
   void Flush(int64_t version);
+  /// Which names are marked from now on (Place::unseen).
+  void SetNameRules(NameRules rules) { name_rules_ = std::make_unique<const NameRules>(std::move(rules)); }
+  /// Writes the first part anew whose key is `key` or more. @return where to go on; -1: there is none behind it.
+  int64_t MarkPart(int64_t key, int64_t version);
   /// Drops the changes, which were rolled back.
   void Forget();
 
@@ -41,10 +48,12 @@ class PlaceWriter {
 
   void FlushList(const List& list, std::vector<int64_t>& changed, int64_t version);
   void UpdatePart(const List& list, int64_t number, const int64_t* begin, const int64_t* end, int64_t version);
+  void PutRow(const Statement& row, int64_t first, PlaceList::Part& part) const;
 
   Database& database_;
   std::vector<int64_t> documents_;  ///< that have changed
   std::vector<int64_t> folders_;
+  std::unique_ptr<const NameRules> name_rules_ = std::make_unique<const NameRules>("");
 };
 
 }  // namespace ferrox::engine

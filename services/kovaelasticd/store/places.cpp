@@ -30,6 +30,18 @@ inline bool CutStep(std::string_view& bytes, uint32_t& number) {
   return whole;
 }
 
+/// In a packed number, above what an access record's may be. The next number is the difference to the one without it,
+/// so that a mark costs once.
+constexpr uint32_t kUnseen = uint32_t{1} << 24;
+
+uint32_t MarkedAccess(const Place& place) { return place.access | (place.unseen != 0 ? kUnseen : 0); }
+
+void PutMarkedAccess(Place& place, uint32_t marked) {
+  const uint32_t access = marked & (kUnseen - 1);
+  place.access = (access > Place::kAccessMax ? 0 : access) & Place::kAccessMax;
+  place.unseen = (marked & kUnseen) != 0 ? 1 : 0;
+}
+
 constexpr size_t kNameBytes = sizeof(uint32_t);
 
 inline uint32_t NameBytes(const char* bytes) {
@@ -58,7 +70,7 @@ std::string PackPlaces(const PlaceList::Part& part) {
   for (size_t i = 0; i < end; ++i) {
     const Place& place = part.places[i];
     PutSigned(packed, int64_t{place.folder} - before.folder);
-    PutSigned(packed, int64_t{place.access} - int64_t{before.access});
+    PutSigned(packed, int64_t{MarkedAccess(place)} - int64_t{before.access});
     before = place;
     if (place.folder == 0) continue;
     packed += static_cast<char>(place.length);
@@ -74,7 +86,8 @@ bool UnpackPlaces(std::string_view packed, PlaceList::Part& part) {
     if (!CutStep(packed, folder) || !CutStep(packed, access)) return false;
     Place& place = part.places[i];
     place.folder = folder;
-    place.access = access & Place::kAccessMax;
+    PutMarkedAccess(place, access);
+    access &= kUnseen - 1;
     place.length = 0;
     part.names[i] = 0;
     if (folder == 0) continue;

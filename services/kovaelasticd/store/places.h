@@ -16,10 +16,11 @@ namespace ferrox::engine {
 
 /// Where a document or folder lies, who may read it, and how long its text is.
 struct Place {
-  static constexpr int64_t kAccessMax = (1 << 24) - 1;
+  static constexpr int64_t kAccessMax = (1 << 23) - 1;
 
   uint32_t folder = 0;       ///< that it lies in; 0: it is not there, or is the folder "/"
-  uint32_t access : 24 = 0;  ///< the number of its access record; 0: it has none, or one beyond kAccessMax
+  uint32_t access : 23 = 0;  ///< the number of its access record; 0: it has none, or one beyond kAccessMax
+  uint32_t unseen : 1 = 0;   ///< its name is one that the share does not show (NameMarks)
   uint32_t length : 8 = 0;   ///< LengthClass of its text
 };
 static_assert(sizeof(Place) == 8);

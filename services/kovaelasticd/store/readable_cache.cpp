@@ -16,7 +16,8 @@ namespace {
 /// The sets of all indices of the process.
 class KeptSets {
  public:
-  using Key = std::tuple<const ReadableCache*, uint32_t, std::vector<uint32_t>, std::string>;
+  /// The last tells whether names are looked at: by which rules follows from the version.
+  using Key = std::tuple<const ReadableCache*, uint32_t, std::vector<uint32_t>, std::string, bool>;
   using Set = std::shared_ptr<const ReadableDocuments>;
 
   static KeptSets& Get() {
@@ -80,7 +81,7 @@ class KeptSets {
 
 std::shared_ptr<const ReadableDocuments> ReadableCache::Load(Database& database, FolderTree& tree, const Places& places,
                                                              const Asker& asker) {
-  KeptSets::Key key(this, asker.uid, asker.groups, asker.share_root);
+  KeptSets::Key key(this, asker.uid, asker.groups, asker.share_root, !asker.unseen_names.empty());
   KeptSets::Set before = KeptSets::Get().Find(key);
   if (before != nullptr && before->Version() == places.Version()) return before;
   // A search that began before the last commits does without what is kept.

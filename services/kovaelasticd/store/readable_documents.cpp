@@ -47,6 +47,7 @@ std::shared_ptr<const ReadableDocuments> ReadableDocuments::Make(Database& datab
   std::string root = asker.share_root;
   while (root.ends_with('/')) root.pop_back();
   const bool usable = asker.share_root.starts_with('/');
+  readable.by_names_ = !asker.unseen_names.empty();
   readable.ReadRecords(database, asker);
   readable.RemoveRootDocument();
   readable.root_document_ = usable ? FindRootDocument(database, tree, root) : -1;
@@ -98,7 +99,8 @@ bool ReadableDocuments::OpenFolders(const PlaceList& folders, int64_t root) {
     }
     bool is_open = folder < end && has(open_, folder);
     for (; !way.empty(); way.pop_back()) {
-      is_open = is_open && Gives(folders.At(way.back()), kMayEnter);
+      const Place& place = folders.At(way.back());
+      is_open = is_open && Gives(place, kMayEnter) && !IsUnseen(place);
       if (is_open) set(open_, way.back());
     }
   }
@@ -113,7 +115,7 @@ void ReadableDocuments::ReadPart(const PlaceList& documents, size_t number) {
     uint64_t bits = 0;
     for (size_t i = 0; part != nullptr && i < 64; ++i) {
       const Place& place = part->places[word * 64 + i];
-      if (!IsOpen(place.folder) || !Gives(place, kMayRead)) continue;
+      if (!IsOpen(place.folder) || !Gives(place, kMayRead) || IsUnseen(place)) continue;
       bits |= uint64_t{1} << i;
       ++sums.documents;
       sums.with_content += place.length != 0 ? 1 : 0;

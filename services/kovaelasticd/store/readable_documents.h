@@ -16,7 +16,9 @@ namespace ferrox::engine {
 /// The documents of one index that one user may read, as of one commit. A folder is open when its record lets the user
 /// enter it, and all above it up to the share's root do, the root among them; what is above the root is not asked. A
 /// document is readable when its folder is open and its own record lets the user read it. What has no record, lies
-/// beside the root, hangs on a folder that was deleted, or on nothing, is closed. Never changes once made.
+/// beside the root, hangs on a folder that was deleted, or on nothing, is closed. For an asker with rules for names,
+/// which the places must be marked by, folders and documents below the root with such a name are closed, too. Never
+/// changes once made.
 class ReadableDocuments {
  public:
   /// Those of the snapshot that `database` has a transaction on and `places` is of; `tree` is the connection's. With
@@ -49,6 +51,7 @@ class ReadableDocuments {
   void AddRootDocument(const PlaceList& documents);
   void RemoveRootDocument();
 
+  bool IsUnseen(const Place& place) const { return by_names_ && place.unseen != 0; }
   bool Gives(const Place& place, uint8_t permission) const {
     return place.access < permissions_.size() && (permissions_[place.access] & permission) != 0;
   }
@@ -57,6 +60,7 @@ class ReadableDocuments {
   }
 
   int64_t version_ = -1;
+  bool by_names_ = false;             ///< names are looked at
   std::vector<uint8_t> permissions_;  ///< by the number of the record; number 0 is none, and gives none
   int64_t root_document_ = -1;        ///< its own document; -1: there is none
   bool root_counts_ = false;          ///< it is readable

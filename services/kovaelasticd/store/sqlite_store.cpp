@@ -71,6 +71,13 @@ void SqliteStore::ClearSome() {
   Commit();
 }
 
+void SqliteStore::ObeySome(const std::string& rules) {
+  if (Obeys(rules) || catalogue_.InTransaction()) return;
+  catalogue_.Begin();
+  catalogue_.MarkNames(rules);
+  Commit();
+}
+
 /// Words of documents that are to be cleared would be counted: it waits for their end.
 void SqliteStore::RebuildSuggestions() {
   suggestions_wanted_ = Uncleared() > 0;

@@ -40,6 +40,8 @@ class SqliteStore : public IndexStore {
   int64_t UncommittedBytes() const override { return uncommitted_bytes_; }
   int64_t Uncleared() const override { return catalogue_.Sums().clearing; }
   void ClearSome() override;
+  bool Obeys(const std::string& rules) const override { return catalogue_.Marks().Obey(rules); }
+  void ObeySome(const std::string& rules) override;
   std::optional<std::chrono::steady_clock::time_point> NextGiveBack() const override;
   void GiveBack(std::chrono::steady_clock::time_point now) override;
   void RebuildSuggestions() override;

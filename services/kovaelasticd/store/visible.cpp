@@ -1,5 +1,6 @@
 #include "services/kovaelasticd/store/visible.h"
 
+#include "services/kovaelasticd/store/name_marks.h"
 #include "services/kovaelasticd/store/store_reader.h"
 
 namespace ferrox::engine {
@@ -15,6 +16,7 @@ Visible::Visible(StoreReader& reader, const Asker* asker)
     return;
   }
   if (reader.tree.IsFlat()) return;  // files of that format have no access records
+  if (!asker->unseen_names.empty()) NameMarks::Require(reader.database, asker->unseen_names);
   places_ = reader.places.Load(reader.database, version_);
   readable_ = reader.readable.Load(reader.database, reader.tree, *places_, *asker);
   documents_ = readable_->Count();

@@ -20,7 +20,7 @@ struct StoreReader;
 class Visible {
  public:
   /// `reader`, which must outlive this as `asker` must, has a transaction open. Null: for who may see everything.
-  /// @throws Error kEngineStorage.
+  /// @throws Error kEngineStorage; kEngineIndexPreparing while names are not marked by the asker's rules.
   Visible(StoreReader& reader, const Asker* asker);
 
   bool Contains(int64_t id) const {
