@@ -81,6 +81,13 @@ TEST_F(UserSearchTest, SharesThatCannotBeEnteredDoNotExist) {
   EXPECT_EQ(one["total"], 2);
   EXPECT_EQ(one["hits"][0]["share"], "other");
   EXPECT_EQ(Send("search", R"({"query":"common -kind:folder","shares":["other"]})")["data"]["total"], 2);
+  // A path as people see it, and the same below a share that is there for nobody else.
+  EXPECT_EQ(Search("", "path:/other -kind:folder")["data"]["total"], 2);
+  EXPECT_FALSE(Search("", "path:/v/other/f1000 path:/other/f1000")["data"].isMember("hints"));
+  closed_.insert("/v/other");
+  std::string hidden = SearchText("", "path:/other/f1000");
+  EXPECT_EQ(hidden.replace(hidden.find("/other"), 6, "/none0"), SearchText("", "path:/none0/f1000"));
+  closed_.clear();
   // An index of which no share is known, be it that of a share that was renamed.
   ASSERT_EQ(CodeOf(SendText(toString(wire::ConfigureIndexRequest("other", "renamed", folder_ / "other")))), 0);
   EXPECT_EQ(SearchText(), all);

@@ -13,6 +13,7 @@
 #include "services/kovaelasticd/commands/merged_search.h"
 #include "services/kovaelasticd/commands/search_answer.h"
 #include "services/kovaelasticd/commands/search_request.h"
+#include "services/kovaelasticd/commands/share_paths.h"
 #include "services/kovaelasticd/commands/user_search.h"
 #include "services/kovaelasticd/query/query.h"
 
@@ -114,9 +115,10 @@ Json::Value HitJson(const AskedIndices& asked, IndexHit& found) {
 }
 
 /// For those who see everything.
-Json::Value SearchEverything(const CommandCall& call, const SearchRequest& request) {
+Json::Value SearchEverything(const CommandCall& call, const SearchRequest& request, AskedQuery& query) {
   const auto began = std::chrono::steady_clock::now();
   AskedIndices asked = OpenAsked(call);
+  ResolveSharePaths(query, asked.open);
   MergedReply found = SearchIndices(asked.open, request, [&asked](const AskedIndex& index, const Error& error) {
     LeaveOut(asked, index.open.id, error);
   });
@@ -141,12 +143,13 @@ Json::Value SearchEverything(const CommandCall& call, const SearchRequest& reque
 
 Json::Value RunSearch(CommandCall& call) {
   SearchRequest request = ReadSearch(call.data);
-  std::vector<std::string> hints;
-  const QueryNode query = ParseQuery(RequiredText(call.data, "query"), Clock::Get().Now(), &hints);
-  request.query = &query;
+  AskedQuery query;
+  query.tree = ParseQuery(RequiredText(call.data, "query"), Clock::Get().Now(), &query.hints);
+  request.query = &query.tree;
   const std::optional<Asker> asker = AskerOf(call.caller, call.data, call.named);
-  Json::Value result = asker.has_value() ? SearchForUser(call, *asker, request) : SearchEverything(call, request);
-  if (!hints.empty()) result["hints"] = Vec2JsonArr(hints);
+  Json::Value result =
+      asker.has_value() ? SearchForUser(call, *asker, request, query) : SearchEverything(call, request, query);
+  if (!query.hints.empty()) result["hints"] = Vec2JsonArr(query.hints);
   return result;
 }
 

@@ -93,11 +93,13 @@ Registry::OpenIndex OpenForUser(const CommandCall& call, const EnteredShare& sha
   return open;
 }
 
-Json::Value SearchForUser(const CommandCall& call, const Asker& asker, const SearchRequest& request) {
+Json::Value SearchForUser(const CommandCall& call, const Asker& asker, const SearchRequest& request,
+                          AskedQuery& query) {
   if (call.data.isMember("id") || call.data.isMember("ids")) {
     throw UserError(Error::kEngineNotPermitted, "ordinary users name \"shares\", not indices");
   }
   UserScope scope = OpenScope(call, asker);
+  ResolveSharePaths(query, scope.indices);
   LivePage page = SearchLivePage(
       scope.indices, request, call.look,
       [&scope](const AskedIndex& index, const Error& error) { LeaveOutShare(scope, index.open.share->share, error); });

@@ -4,6 +4,7 @@
 
 #include "services/kovaelasticd/commands/commands.h"
 #include "services/kovaelasticd/commands/entered_shares.h"
+#include "services/kovaelasticd/commands/share_paths.h"
 #include "services/kovaelasticd/indices/registry.h"
 #include "services/kovaelasticd/store/asker.h"
 #include "services/kovaelasticd/store/index_store.h"
@@ -11,9 +12,9 @@
 namespace ferrox::engine {
 
 /// The command "search" for an ordinary user: what the asker may read of the shares that the asker can enter. Every
-/// member of the reply follows from that alone.
+/// member of the reply follows from that alone. `query` is that of the request; its paths are resolved.
 /// @throws Error; what an ordinary user is told of it is SentenceForUsers.
-Json::Value SearchForUser(const CommandCall& call, const Asker& asker, const SearchRequest& request);
+Json::Value SearchForUser(const CommandCall& call, const Asker& asker, const SearchRequest& request, AskedQuery& query);
 
 /// Opens the index of a share for an asker. @throws Error when it is not to be searched for users: refused to them,
 /// being prepared, paused, unreadable, or no longer that of the share.

@@ -53,6 +53,9 @@ constexpr size_t kQueryMaxBytes = 4096;
 constexpr size_t kQueryMaxTerms = 64;
 constexpr size_t kQueryMaxDepth = 16;
 
+/// The most hints about one.
+constexpr size_t kQueryHintsMax = 3;
+
 /// Reads a query. Dates are taken in local time; `now` (seconds since the epoch) is what relative ones count from.
 /// `hints`, unless null, gets sentences about what was read otherwise than it may be meant.
 /// @throws Error kEngineBadRequest with a sentence that names the place, counted in characters from 1, and the remedy.

@@ -18,8 +18,6 @@ namespace ferrox::engine {
 
 namespace {
 
-constexpr size_t kHintsMax = 3;
-
 QueryNode RangeNode(QueryNode::Type type, const ValueRange& range) {
   QueryNode node(type);
   node.low = range.low;
@@ -66,7 +64,7 @@ void ConditionReader::Refuse(size_t at, const std::string& sentence) const {
 }
 
 void ConditionReader::Hint(const std::string& sentence) const {
-  if (hints_ == nullptr || hints_->size() == kHintsMax ||
+  if (hints_ == nullptr || hints_->size() == kQueryHintsMax ||
       std::find(hints_->begin(), hints_->end(), sentence) != hints_->end())
     return;
   hints_->push_back(sentence);
