@@ -1,10 +1,16 @@
+#include <optional>
 #include <string>
 #include <string_view>
 #include <utility>
+#include <vector>
 
+#include "common/error.h"
+#include "services/kovaelasticd/query/field_names.h"
+#include "services/kovaelasticd/query/field_start.h"
 #include "services/kovaelasticd/query/number_run.h"
 #include "services/kovaelasticd/query/query.h"
 #include "services/kovaelasticd/query/query_conditions.h"
+#include "services/kovaelasticd/query/query_lexer.h"
 
 namespace ferrox::engine {
 
