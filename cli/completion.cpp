@@ -3,6 +3,7 @@
 #include <dirent.h>
 
 #include <algorithm>
+#include <chrono>
 #include <cstdio>
 
 #include "base/files.h"
@@ -10,14 +11,17 @@
 #include "cli/caller.h"
 #include "cli/command_table.h"
 #include "cli/folder_path.h"
+#include "cli/format.h"
 #include "cli/global_options.h"
 #include "cli/kinds.h"
 #include "common/file_util.h"
 #include "fileindex/folders/folder_mgr.h"
 #include "sdk/share.h"
+#include "wire/engine_requests.h"
+#include "wire/frame_client.h"
 
 /// Completion goes by the table of commands: names, options, and what the usage lines call the words ("SHARE", "PATH").
-/// It asks no daemon, so that pressing a key never waits.
+/// The words of a search are completed by the engine, which has a second: pressing a key must not wait for anything.
 namespace ferrox::cli {
 
 namespace {
@@ -63,11 +67,25 @@ Words KindLists(const std::string& typed) {
   return found;
 }
 
+/// For QUERY: what the last word may become, by the documents that the caller may read.
+Words QueryWords(const std::string& typed) {
+  constexpr std::chrono::seconds kLongest(1);
+  if (typed.size() < 2) return {};
+  Json::Value data;
+  data["text"] = typed;
+  const wire::Reply reply = wire::AskEngine(wire::EngineRequest("complete", data), kLongest);
+  Words found;
+  if (reply.outcome != wire::Outcome::kAnswered) return found;
+  for (const Json::Value& completion : reply.data["completions"]) found.push_back(TextOf(completion, "text"));
+  return found;
+}
+
 /// What can stand for a name of the usage line.
 Words Candidates(std::string name, const std::string& typed) {
   if (name.find('|') != std::string::npos) return Split(name, '|');
   while (!name.empty() && (name.back() == ']' || name.back() == '.')) name.pop_back();
   if (!name.empty() && name[0] == '[') name.erase(0, 1);
+  if (name == "QUERY") return QueryWords(typed);
   // Which shares and folders there are is read from files that are closed to ordinary users.
   if (!IsPrivileged() && (name == "SHARE" || name == "PATH")) return {};
   if (name == "SHARE") return sdk::SDKShare::Enum();

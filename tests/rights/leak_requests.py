@@ -59,5 +59,5 @@ def requests(share, own, theirs):
         found.append((command, {}))
         found.append((command, {"id": "fileindex_docs", "shares": ["docs", "hidden"], "timeout_ms": 20000}))
     for part in sorted({p[:2] for p in own} | {p[:3] for p in theirs}):
-        found.append(("complete", {"query": part}))
+        found.append(("complete", {"text": part}))
     return found

@@ -32,6 +32,7 @@ constexpr Command kOtherCommands[] = {{"access_set", &RunAccessSet, Users::kPriv
                                       {"commit", &OnCommit, Users::kPrivileged},
                                       {"update_term_suggestion", &OnUpdateTermSuggestion, Users::kPrivileged},
                                       {"search", &RunSearch, Users::kEveryoneAndFor},
+                                      {"complete", &RunComplete, Users::kEveryoneAndFor},
                                       {"show", &RunShow, Users::kEveryoneAndFor},
                                       {"fresh", &RunFresh, Users::kEveryone},
                                       {"shares", &RunShares, Users::kEveryoneAndFor},

@@ -72,6 +72,8 @@ Json::Value RunAccessSet(CommandCall& call);
 Json::Value RunFolderDigests(CommandCall& call);
 /// The command "search" (search_command.cpp).
 Json::Value RunSearch(CommandCall& call);
+/// The command "complete" (complete_command.cpp).
+Json::Value RunComplete(CommandCall& call);
 /// The command "show" (show_command.cpp).
 Json::Value RunShow(CommandCall& call);
 /// The commands "fresh" and "shares" (relayed_commands.cpp).

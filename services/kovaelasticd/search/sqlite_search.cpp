@@ -5,6 +5,7 @@
 #include <utility>
 
 #include "services/kovaelasticd/search/column_order.h"
+#include "services/kovaelasticd/search/complete.h"
 #include "services/kovaelasticd/store/file_links.h"
 #include "services/kovaelasticd/store/packed_fields.h"
 #include "services/kovaelasticd/store/sqlite_store.h"
@@ -45,6 +46,11 @@ SearchHit Searcher::LoadHit(const RankedDocument& ranked, const FoundWords& word
 }
 
 SearchReply Searcher::Run() {
+  if (!request_.completed.empty()) {
+    SearchReply reply;
+    reply.completions = CompleteWord(reader_, visible_, request_.completed, static_cast<size_t>(request_.limit));
+    return reply;
+  }
   QueryEvaluator evaluator(reader_, visible_, request_.ranked_max);
   const DocSet documents = evaluator.Evaluate(*request_.query);
   SearchReply reply;

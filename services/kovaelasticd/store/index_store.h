@@ -77,6 +77,8 @@ struct SearchRequest {
   std::string mark_start = "[";
   std::string mark_end = "]";
   const Asker* asker = nullptr;  ///< lives as long as the search; null: whoever asks may read everything
+  /// Unless "": no query, but the beginning of a word. The reply has completions of it alone, `limit` at most.
+  std::string completed = {};
 };
 
 /// What one word of a query, or something else about a document, adds to its score.
@@ -91,6 +93,13 @@ struct RepairedWord {
   std::string from;   ///< as it was typed, folded
   std::string to;     ///< a word of documents that whoever asks may read
   bool also = false;  ///< `from` itself is found too: its hits come first
+};
+
+/// A word that what was typed is the beginning of.
+struct Completion {
+  std::string word;
+  int64_t documents = 0;  ///< that have it; of a word of names and titles, there
+  bool in_name = false;   ///< in names or titles
 };
 
 /// A document that was found, as it is shown.
@@ -117,6 +126,7 @@ struct SearchReply {
   bool ranking_bounded = false;          ///< there were more than ranked_max to order; some were left out of that
   std::vector<SearchHit> hits;           ///< from the first, offset + limit of them at most
   std::vector<std::string> suggestions;  ///< other spellings, when nothing was found
+  std::vector<Completion> completions;   ///< where it was no search
 };
 
 /// Figures of an index; those of documents are as of its last commit.

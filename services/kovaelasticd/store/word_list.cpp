@@ -61,6 +61,19 @@ WordList::Group WordList::Merged(const Group& a, const Group& b, size_t size) {
   return merged;
 }
 
+size_t WordList::Group::FirstFrom(std::string_view begin, size_t size) const {
+  size_t first = 0;
+  for (size_t end = letters.size(); first < end;) {
+    const size_t middle = first + (end - first) / 2;
+    if (Word(middle, size) < begin) {
+      first = middle + 1;
+    } else {
+      end = middle;
+    }
+  }
+  return first;
+}
+
 void WordList::Merge(const WordList& more) {
   for (size_t size = 0; size < groups_.size(); ++size) {
     if (!more.groups_[size].letters.empty()) groups_[size] = Merged(groups_[size], more.groups_[size], size);

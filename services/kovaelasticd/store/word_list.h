@@ -42,6 +42,18 @@ class WordList {
     }
   }
 
+  /// Calls `visit(word, in_several)` for each word that begins with `begin`, those of one size in the order of bytes.
+  template <typename Visitor>
+  void ForEachBeginning(std::string_view begin, Visitor&& visit) const {
+    for (size_t bytes = begin.size(); bytes <= kMostBytes; ++bytes) {
+      const Group& group = groups_[bytes];
+      for (size_t i = group.FirstFrom(begin, bytes); i < group.letters.size(); ++i) {
+        if (!group.Word(i, bytes).starts_with(begin)) break;
+        visit(group.Word(i, bytes), (group.letters[i] & kInSeveral) != 0);
+      }
+    }
+  }
+
  private:
   static constexpr uint32_t kInSeveral = 1;  ///< a bit that no letter has
 
@@ -50,6 +62,7 @@ class WordList {
     std::vector<char> bytes;
     std::vector<uint32_t> letters;
     std::string_view Word(size_t i, size_t size) const { return {bytes.data() + i * size, size}; }
+    size_t FirstFrom(std::string_view begin, size_t size) const;
   };
 
   /// A bit for each letter of ASCII; other bytes share these.
