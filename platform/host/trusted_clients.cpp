@@ -1,12 +1,16 @@
 #include "platform/host/trusted_clients.h"
 
 #include <pwd.h>
+#include <shadow.h>
 #include <syslog.h>
 
 #include <algorithm>
 #include <cstdio>
+#include <ctime>
 #include <memory>
+#include <set>
 #include <string>
+#include <vector>
 
 #include "platform/host/configuration.h"
 #include "platform/host/log.h"
@@ -15,30 +19,54 @@ namespace kova::host {
 
 namespace {
 
-/// The uids of local accounts; of a name that is not there, none.
-std::vector<uid_t> LocalUids(const std::vector<std::string>& names) {
-  std::vector<uid_t> uids;
-  std::vector<std::string> missing = names;
-  const std::unique_ptr<FILE, int (*)(FILE*)> file(fopen("/etc/passwd", "re"), &fclose);
+struct FileClose {
+  void operator()(FILE* file) const { (void)fclose(file); }
+};
+
+/// The entries of a file of accounts, each of which `read` takes as fgetpwent_r and fgetspent_r do.
+template <typename Entry, typename Take>
+void ForEachEntry(const char* path, int (*read)(FILE*, Entry*, char*, size_t, Entry**), Take take) {
+  const std::unique_ptr<FILE, FileClose> file(fopen(path, "re"));
   std::vector<char> buffer(64U << 10);
-  passwd entry = {};
-  passwd* found = nullptr;
-  while (file != nullptr && fgetpwent_r(file.get(), &entry, buffer.data(), buffer.size(), &found) == 0) {
-    if (std::erase(missing, std::string(entry.pw_name)) != 0) uids.push_back(entry.pw_uid);
-  }
+  Entry entry = {};
+  Entry* found = nullptr;
+  while (file != nullptr && read(file.get(), &entry, buffer.data(), buffer.size(), &found) == 0) take(entry);
+}
+
+std::set<std::string> EndedAccounts() {
+  constexpr long kSecondsOfDay = 24L * 60 * 60;
+  const long today = static_cast<long>(time(nullptr) / kSecondsOfDay);
+  std::set<std::string> names;
+  ForEachEntry<spwd>("/etc/shadow", &fgetspent_r, [&](const spwd& entry) {
+    if (entry.sp_expire >= 0 && entry.sp_expire <= today) names.insert(entry.sp_namp);
+  });
+  return names;
+}
+
+/// A name without a local account is nobody's.
+TrustedClients FindAccounts(const std::vector<std::string>& names) {
+  TrustedClients clients;
+  const std::set<std::string> ended = EndedAccounts();
+  std::vector<std::string> missing = names;
+  ForEachEntry<passwd>("/etc/passwd", &fgetpwent_r, [&](const passwd& entry) {
+    if (std::erase(missing, std::string(entry.pw_name)) != 0) clients.uids.push_back(entry.pw_uid);
+    if (ended.contains(entry.pw_name)) clients.ended.push_back(entry.pw_uid);
+  });
   for (const std::string& name : missing) {
     LogChange(LOG_ERR, "trusted client " + name,
               "the settings name a trusted client \"" + name + "\", which has no account in /etc/passwd");
   }
-  return uids;
+  return clients;
 }
 
 }  // namespace
 
 TrustedClients GetTrustedClients() {
   const std::shared_ptr<const Configuration> settings = GetConfiguration();
-  if (!settings->problem.empty() || settings->trusted_clients.empty()) return {{}, settings->least_user};
-  return {LocalUids(settings->trusted_clients), settings->least_user};
+  const bool none = !settings->problem.empty() || settings->trusted_clients.empty();
+  TrustedClients clients = none ? TrustedClients() : FindAccounts(settings->trusted_clients);
+  clients.least_user = settings->least_user;
+  return clients;
 }
 
 }  // namespace kova::host

@@ -11,9 +11,12 @@ namespace kova::host {
 struct TrustedClients {
   std::vector<uid_t> uids = {};
   uint32_t least_user = 1000;  ///< for no user with a smaller uid
+  /// Nor for these: accounts of /etc/passwd that have expired, by /etc/shadow as far as this process may read it. None
+  /// where nobody is trusted.
+  std::vector<uid_t> ended = {};
 };
 
-/// Those of now: reads /etc/passwd where the settings name any. They are accounts of that file: nobody on the network
+/// Those of now: reads those files where the settings name any. They are accounts of that file: nobody on the network
 /// is waited for, or can become one. A name without such an account is logged; settings with a mistake name nobody. Any
 /// thread may call.
 TrustedClients GetTrustedClients();

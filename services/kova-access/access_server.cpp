@@ -24,8 +24,10 @@ Json::Value JsonOf(const wire::LiveFile& file) {
 Json::Value JsonOf(const wire::Trust& trust) {
   Json::Value json;
   json["least_user"] = trust.least_user;
-  Json::Value& clients = json["clients"] = Json::Value(Json::arrayValue);
-  for (const uint32_t uid : trust.clients) clients.append(uid);
+  for (const auto& [name, uids] : {std::pair("clients", &trust.clients), std::pair("ended", &trust.ended)}) {
+    Json::Value& list = json[name] = Json::Value(Json::arrayValue);
+    for (const uint32_t uid : *uids) list.append(uid);
+  }
   return json;
 }
 

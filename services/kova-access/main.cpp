@@ -34,7 +34,7 @@ constexpr unsigned kConnectionsMax = 64;
 
 wire::Trust ReadTrust() {
   kova::host::TrustedClients clients = kova::host::GetTrustedClients();
-  return {std::move(clients.uids), clients.least_user};
+  return {std::move(clients.uids), clients.least_user, std::move(clients.ended)};
 }
 
 void Serve() {

@@ -137,7 +137,7 @@ class NamedUsersTest : public EngineTest {
     return CodeOf(reply);
   }
 
-  Trust trust_{{kClient}, 1000};
+  Trust trust_{{kClient}, 1000, {4000}};
   std::optional<std::string> answer_;
   std::promise<void> go_on_;
   const std::shared_future<void> go_on_future_ = go_on_.get_future().share();
@@ -244,6 +244,7 @@ TEST_F(NamedUsersTest, WhoMayNotBeAskedForAndWhoCannotBeLookedUp) {
   } cases[] = {{"root", R"({"uid":0,"gids":[0],"may_log_in":true,"rules":[]})", 1406},
                {"low", R"({"uid":999,"gids":[9],"may_log_in":true,"rules":[]})", 1406},
                {"nologin", R"({"uid":3000,"gids":[9],"may_log_in":false,"rules":[]})", 1406},
+               {"ended", R"({"uid":4000,"gids":[9],"may_log_in":true,"rules":[]})", 1406},
                {"none", "{}", 1406},
                {"cut", R"({"uid":3000,"gids":[9],"may_)", 1414},
                {"shape", R"({"uid":3000,"gids":[],"may_log_in":true,"rules":[]})", 1414},

@@ -9,12 +9,13 @@ import os
 import pickle
 import socket
 import struct
+import subprocess
 import sys
 import time
 
 sys.path.insert(0, os.path.join(os.path.dirname(os.path.abspath(__file__)), "..", "integration"))
 
-from instance import to_bytes  # noqa: E402
+from instance import BIN, to_bytes  # noqa: E402
 from live import LiveInstance  # noqa: E402
 
 SKIPPED = 77  # the exit code of a program that cannot prove anything here
@@ -47,11 +48,12 @@ def end(text, failures):
 
 
 class SharedInstance(LiveInstance):
-    """An instance of root's in a folder that all users may enter."""
+    """An instance of root's in a folder that all users may enter; its engine is a user of its own, as on a server."""
 
     def __init__(self, root=None):
         super().__init__(root)
         os.chmod(self.root, 0o755)
+        subprocess.run([os.path.join(BIN, "kovaelasticd"), "--prepare", "50009"], env=self.env, check=True)
         self.ctl("up")
 
         os.chmod(self.engine_socket(), 0o666)  # whatever it is on an installed system

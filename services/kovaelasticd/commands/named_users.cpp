@@ -92,8 +92,10 @@ NamedUserPtr NamedUsers::Find(const Json::Value& user, std::vector<std::string> 
   const std::vector<std::string> key = UserArguments(user);
   const AccountPtr account = LookUp(key, std::make_shared<const std::vector<std::string>>(std::move(names)));
   const uint32_t uid = account->user.uid;
-  const bool permitted = account->may_log_in && uid != 0 && uid != UINT32_MAX && uid != instance_owner_ &&
-                         uid >= sources_.trust().least_user;
+  const Trust trust = sources_.trust();
+  const bool ended = std::find(trust.ended.begin(), trust.ended.end(), uid) != trust.ended.end();
+  const bool permitted = account->may_log_in && !ended && uid != 0 && uid != UINT32_MAX && uid != instance_owner_ &&
+                         uid >= trust.least_user;
   if (!permitted) {
     throw UserError(Error::kEngineNotPermitted, "\"" + key.back() + "\" may not search by way of another program");
   }
