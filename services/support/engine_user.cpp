@@ -1,7 +1,6 @@
 #include "services/support/engine_user.h"
 
 #include <endian.h>
-#include <sys/stat.h>
 #include <sys/xattr.h>
 #include <syslog.h>
 
