@@ -127,6 +127,7 @@ class Recoll:
     have no processor time. It reads as many formats as it finds helpers for."""
 
     name = "recoll"
+    settings = ""  # further lines of its configuration
 
     def __init__(self, scratch):
         self.config = os.path.join(scratch, "recoll")
@@ -148,7 +149,7 @@ class Recoll:
 
     def index(self, folder):
         with open(f"{self.config}/recoll.conf", "w", encoding="utf-8") as file:
-            file.write(f"topdirs = {folder}\nloglevel = 2\nidxniceprio = 0\n")
+            file.write(f"topdirs = {folder}\nloglevel = 2\nidxniceprio = 0\n{self.settings}")
         with Descendants() as used:
             start = time.monotonic()
             self.run("recollindex", "-c", self.config)

@@ -95,10 +95,17 @@ class Fts5:
 
 
 class Recoll(indexers.Recoll):
-    """Asked through its Python module."""
+    """Asked through its Python module. It is told that the corpus has manual pages where /usr/share/man has them."""
+
+    MIMEMAP = "/usr/share/recoll/examples/mimemap"
+    settings = "noaspell = 1\n"
 
     def __init__(self, scratch, corpus):
         super().__init__(scratch)
+        with open(self.MIMEMAP, encoding="utf-8") as file:
+            pages = re.search(r"^\[/usr/share/man\]\n([^\[]*)", file.read(), re.M)
+        with open(f"{self.config}/mimemap", "w", encoding="utf-8") as file:
+            file.write(f"[{corpus}/usr/share/man]\n{pages[1] if pages else ''}")
         self.figures = self.index(corpus)
         from recoll import recoll  # pylint: disable=import-outside-toplevel
         self.db = recoll.connect(confdir=self.config)
