@@ -98,7 +98,8 @@ MergedReply AddUp(std::vector<IndexReply>& replies) {
   MergedReply merged;
   int64_t total_all = 0;
   bool none_found = true;
-  for (auto& [index, reply] : replies) {
+  for (IndexReply& of : replies) {
+    SearchReply& reply = of.reply;
     merged.total += reply.total;
     total_all += reply.total_all.value_or(reply.total);
     merged.ranking_bounded = merged.ranking_bounded || reply.ranking_bounded;
