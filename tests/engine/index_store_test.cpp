@@ -1,4 +1,7 @@
 // Catches documents that are not found by a part of theirs, or found when they are gone or not committed.
+#include <chrono>
+#include <future>
+#include <latch>
 #include <map>
 #include <memory>
 #include <set>
@@ -404,6 +407,28 @@ TEST_F(IndexStoreTest, WorkThatTakesTooLongEndsAndTheNextSearchRunsOn) {
               }));
     EXPECT_EQ(Error::kEngineUserBusy, code([&] { (void)FindPaths(*store_, "word"); }));
   }
+  const auto search_holding = [&](size_t bytes) {
+    const WorkLimit limit(std::chrono::hours(1));
+    WorkLimit::Require(bytes);
+    return code([&] { (void)FindPaths(*store_, "word"); });
+  };
+  const size_t each = WorkLimit::MemoryOfAll() / 2;
+  EXPECT_EQ(0, search_holding(each / 2));
+  EXPECT_EQ(Error::kEngineUserBusy, search_holding(each - 1));
+  std::latch held(2), done(1);
+  const auto hold = [&] {
+    const WorkLimit limit(std::chrono::hours(1));
+    WorkLimit::Require(each - 1);
+    held.count_down();
+    done.wait();
+  };
+  {
+    const auto one = std::async(std::launch::async, hold), two = std::async(std::launch::async, hold);
+    held.wait();
+    EXPECT_EQ(Error::kEngineBusyMemory, search_holding(1));
+    done.count_down();
+  }
+  EXPECT_EQ(0, search_holding(each / 2)) << "given back";
   EXPECT_EQ("/v/a", FindPaths(*store_, "word"));
 }
 

@@ -7,6 +7,7 @@
 #include <utility>
 
 #include "common/clock.h"
+#include "services/kovaelasticd/store/work_limit.h"
 
 namespace ferrox::engine {
 
@@ -55,6 +56,7 @@ std::vector<RelevanceRanking::Candidate> RelevanceRanking::Candidates(const DocS
   std::vector<Candidate> candidates;
   const int64_t skip = std::max<int64_t>(0, total - static_cast<int64_t>(ranked_max_));
   bounded = skip > 0;
+  WorkLimit::Require(static_cast<size_t>(total - skip) * (sizeof(Candidate) + words_.size()));
   candidates.reserve(static_cast<size_t>(total - skip));
   DocSet by_name;
   if (bounded) {

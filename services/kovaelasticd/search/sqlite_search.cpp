@@ -23,6 +23,10 @@ std::vector<RankedDocument> Searcher::OrderByRelevance(const DocSet& documents, 
   return ranking.Page(documents, reply.total, order, reply.ranking_bounded);
 }
 
+// What a hit takes in memory, roughly: beside its fields, and these by their packed bytes.
+constexpr size_t kHitBytes = 1024;
+constexpr size_t kFieldsTimes = 8;
+
 /// A hit as it is shown. The text is unpacked only for a snippet, so a page unpacks as many texts as it has hits.
 SearchHit Searcher::LoadHit(const RankedDocument& ranked, const FoundWords& words) {
   SearchHit hit;
@@ -31,6 +35,7 @@ SearchHit Searcher::LoadHit(const RankedDocument& ranked, const FoundWords& word
   hit.name_key = ranked.name_key;
   const std::optional<StoredDocument> stored = FindDocument(reader_.database, reader_.tree, ranked.id);
   if (!stored.has_value()) return hit;
+  WorkLimit::Require(kHitBytes + kFieldsTimes * stored->row.packed.size());
   hit.path = stored->row.path;
   hit.is_folder = stored->row.kind == kFolder;
   hit.stamp = TextField(stored->row.packed, reader_.names.NumberOf(FileLinks::kStamp)).value_or("");

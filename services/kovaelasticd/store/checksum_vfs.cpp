@@ -8,14 +8,17 @@
 #include <limits>
 #include <memory>
 #include <new>
+#include <type_traits>
 
 #include "common/log.h"
 #include "services/kovaelasticd/store/page_checksums.h"
+#include "services/kovaelasticd/store/work_limit.h"
 
 namespace ferrox::engine {
 
 namespace {
 
+constexpr int kLimitReads = 0x4B4F5641;  ///< of a file: SQLite's own operations are below 100
 constexpr int kFileHeaderBytes = 100;
 constexpr int kReservedAt = 20;  ///< the place in the file's header that tells how many bytes of a page are reserved
 
@@ -37,6 +40,7 @@ struct LayerFile : sqlite3_file {
 struct CheckedFile : LayerFile {
   int page_size = 0;     ///< 0: not known, since the file has no header yet
   bool checked = false;  ///< the pages have checksums
+  bool limited = false;  ///< ObeyWorkLimit
   std::unique_ptr<uint8_t[]> scratch;
 
   /// Takes from the file's first bytes what they tell. Anything but a header changes nothing.
@@ -116,6 +120,7 @@ int ReportDamage(const LayerFile& file, const char* what, sqlite3_int64 number) 
 /// for none that was not written.
 int ReadDatabase(sqlite3_file* opened, void* bytes, int amount, sqlite3_int64 offset) {
   auto& file = *static_cast<CheckedFile*>(opened);
+  if (file.limited && WorkLimit::IsOver()) return SQLITE_INTERRUPT;
   const int result = file.Read(bytes, amount, offset);
   if (result != SQLITE_OK && result != SQLITE_IOERR_SHORT_READ) return result;
   const auto* page = static_cast<const uint8_t*>(bytes);
@@ -125,6 +130,13 @@ int ReadDatabase(sqlite3_file* opened, void* bytes, int amount, sqlite3_int64 of
   const bool damaged =
       file.checked ? !IsPageWhole(page, static_cast<size_t>(amount), number) : number == 1 && file.HasLostItsMark(page);
   return damaged ? ReportDamage(file, "page", number) : result;
+}
+
+int ControlDatabase(sqlite3_file* opened, int operation, void* argument) {
+  auto& file = *static_cast<CheckedFile*>(opened);
+  if (operation != kLimitReads) return file.beneath->pMethods->xFileControl(file.beneath, operation, argument);
+  file.limited = *static_cast<const bool*>(argument);
+  return SQLITE_OK;
 }
 
 int WriteDatabase(sqlite3_file* opened, const void* bytes, int amount, sqlite3_int64 offset) {
@@ -203,7 +215,7 @@ const sqlite3_io_methods& MethodsOf(int (*read)(sqlite3_file*, void*, int, sqlit
     methods.xLock = &PassFile<&M::xLock>::Call;
     methods.xUnlock = &PassFile<&M::xUnlock>::Call;
     methods.xCheckReservedLock = &PassFile<&M::xCheckReservedLock>::Call;
-    methods.xFileControl = &PassFile<&M::xFileControl>::Call;
+    methods.xFileControl = std::is_same_v<File, CheckedFile> ? &ControlDatabase : &PassFile<&M::xFileControl>::Call;
     methods.xSectorSize = &PassFile<&M::xSectorSize>::Call;
     methods.xDeviceCharacteristics = &PassFile<&M::xDeviceCharacteristics>::Call;
     methods.xShmMap = &PassFile<&M::xShmMap>::Call;
@@ -281,6 +293,10 @@ sqlite3_vfs MakeLayer(sqlite3_vfs* beneath) {
 }
 
 }  // namespace
+
+void ObeyWorkLimit(sqlite3* connection, bool whether) {
+  (void)sqlite3_file_control(connection, "main", kLimitReads, &whether);
+}
 
 const char* ChecksumVfs() {
   static sqlite3_vfs vfs = MakeLayer(sqlite3_vfs_find(nullptr));

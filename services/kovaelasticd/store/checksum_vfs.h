@@ -1,5 +1,7 @@
 #pragma once
 
+#include <sqlite3.h>
+
 namespace ferrox::engine {
 
 /// The name, for sqlite3_open_v2, of a layer between SQLite and the system's files ("VFS") that keeps the checksums of
@@ -16,5 +18,10 @@ namespace ferrox::engine {
 /// confirmed and forgot; and a log that SQLite recovers after a crash, which SQLite checks itself and uses up to the
 /// first frame that is not whole.
 const char* ChecksumVfs();
+
+/// For a connection that only reads: has reads of its file end with SQLITE_INTERRUPT once the calling thread's
+/// WorkLimit is over. FTS5 merges all words with one beginning in one step of SQLite's machine, and reads their pages
+/// meanwhile.
+void ObeyWorkLimit(sqlite3* connection, bool whether);
 
 }  // namespace ferrox::engine

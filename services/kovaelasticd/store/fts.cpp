@@ -110,6 +110,13 @@ struct PhraseVisit {
   bool content;  ///< the table of contents, which has one column
 };
 
+/// All rows of a phrase are one step of SQLite's machine: it is ended here when the request is over.
+int Hand(int64_t id, const PhraseVisit& visit, uint8_t count, uint8_t places) {
+  const bool goes_on =
+      visit.collector->Add(id, visit.content ? count : uint8_t{0}, visit.content ? uint8_t{0} : places);
+  return goes_on ? SQLITE_OK : SQLITE_INTERRUPT;
+}
+
 /// Adds up one phrase's occurrences in a row.
 int ReadRowHits(const Fts5ExtensionApi* api, Fts5Context* row, int phrase, uint8_t& count, uint8_t& places) {
   Fts5PhraseIter iterator;
@@ -131,8 +138,7 @@ int VisitRow(const Fts5ExtensionApi* api, Fts5Context* row, void* user) {
   uint8_t places = 0;
   const int result = ReadRowHits(api, row, 0, count, places);
   if (result != SQLITE_OK) return result;
-  visit->collector->Add(api->xRowid(row), visit->content ? count : uint8_t{0}, visit->content ? uint8_t{0} : places);
-  return SQLITE_OK;
+  return Hand(api->xRowid(row), *visit, count, places);
 }
 
 /// Hands the row under the caller's cursor to the collector.
@@ -143,8 +149,7 @@ int CollectRow(const Fts5ExtensionApi* api, Fts5Context* row, PhraseVisit& visit
     const int result = ReadRowHits(api, row, phrase, count, places);
     if (result != SQLITE_OK) return result;
   }
-  visit.collector->Add(api->xRowid(row), visit.content ? count : uint8_t{0}, visit.content ? uint8_t{0} : places);
-  return SQLITE_OK;
+  return Hand(api->xRowid(row), visit, count, places);
 }
 
 /// kova_collect(table, collector, all): with `all` not 0, walks all rows of each phrase of the expression, in place of
@@ -197,8 +202,27 @@ void HitCollector::Shorten() {
   shorten_at_ = 2 * hits_.size();
 }
 
+HitCollector::~HitCollector() { WorkLimit::Release(held_bytes_); }
+
+/// To twice the size, as a vector does; what a vector has twice while it grows is not counted.
+bool HitCollector::Grow() {
+  const size_t capacity =
+      std::max<size_t>(1024, std::min(2 * hits_.capacity(), std::max(shorten_at_, hits_.size() + 1)));
+  const size_t more = (capacity - hits_.capacity()) * sizeof(WordHit);
+  if (!WorkLimit::Hold(more)) return false;
+  held_bytes_ += more;
+  hits_.reserve(capacity);
+  return true;
+}
+
+/// The hits count for the request until its end, without what was only room for more.
 std::vector<WordHit> HitCollector::TakeHits() {
-  if (visible_.IsForAsker()) Shorten();
+  if (visible_.IsForAsker()) {
+    Shorten();
+    hits_.shrink_to_fit();
+    WorkLimit::Release(held_bytes_ - std::min(held_bytes_, hits_.size() * sizeof(WordHit)));
+  }
+  held_bytes_ = 0;
   return std::move(hits_);
 }
 

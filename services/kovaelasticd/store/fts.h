@@ -7,6 +7,7 @@
 #include "services/kovaelasticd/store/doc_set.h"
 #include "services/kovaelasticd/store/sqlite_db.h"
 #include "services/kovaelasticd/store/visible.h"
+#include "services/kovaelasticd/store/work_limit.h"
 
 namespace ferrox::engine {
 
@@ -31,14 +32,20 @@ class HitCollector {
   /// `visible` must outlive this. `hits_max` may be 0.
   HitCollector(size_t hits_max, const Visible& visible)
       : hits_max_(hits_max), shorten_at_(2 * hits_max), visible_(visible) {}
-  /// Documents come in ascending order, phrase by phrase.
-  void Add(int64_t id, uint8_t count, uint8_t places) {
-    ++seen_;
-    if (!visible_.Contains(id)) return;
+  HitCollector(const HitCollector&) = delete;
+  HitCollector& operator=(const HitCollector&) = delete;
+  ~HitCollector();
+  /// Documents come in ascending order, phrase by phrase. @return whether there is time and memory for more
+  /// (WorkLimit).
+  bool Add(int64_t id, uint8_t count, uint8_t places) {
+    if (++seen_ % kLookEvery == 0 && WorkLimit::IsOver()) return false;
+    if (!visible_.Contains(id)) return true;
     set_.Add(id);
-    if (hits_max_ == 0) return;
+    if (hits_max_ == 0) return true;
     if (hits_.size() >= shorten_at_) Shorten();
+    if (hits_.size() == hits_.capacity() && !Grow()) return false;
     hits_.push_back({static_cast<uint32_t>(id), count, places});
+    return true;
   }
   const DocSet& Set() const { return set_; }
   /// How often Add was called: the work that it was.
@@ -48,7 +55,10 @@ class HitCollector {
   std::vector<WordHit> TakeHits();
 
  private:
+  static constexpr size_t kLookEvery = 1024;
+
   void Shorten();
+  bool Grow();
 
   const size_t hits_max_;
   size_t shorten_at_;
@@ -56,6 +66,7 @@ class HitCollector {
   const Visible& visible_;
   DocSet set_;
   std::vector<WordHit> hits_;
+  size_t held_bytes_ = 0;  ///< of the hits, as WorkLimit counts them, until they are taken
 };
 
 /// Makes our tokenizer ("kova") and the function kova_collect known to a connection.

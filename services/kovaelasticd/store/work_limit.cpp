@@ -1,8 +1,13 @@
 #include "services/kovaelasticd/store/work_limit.h"
 
-#include <optional>
+#include <unistd.h>
+
+#include <algorithm>
+#include <atomic>
+#include <cstdint>
 
 #include "common/error.h"
+#include "services/kovaelasticd/store/checksum_vfs.h"
 
 namespace ferrox::engine {
 
@@ -12,29 +17,88 @@ using WorkClock = std::chrono::steady_clock;
 
 /// Steps of SQLite's machine between two looks at the clock: well below a millisecond.
 constexpr int kStepsBetweenLooks = 10000;
+constexpr uint64_t kMemoryMost = uint64_t{256} << 20;
 
-thread_local std::optional<WorkClock::time_point> t_work_end;
+/// Of the calling thread's request.
+struct Work {
+  bool limited = false;
+  WorkClock::time_point end;
+  size_t held = 0;
+  int refused = 0;  ///< the code of the failure once memory was refused
+};
+thread_local Work t_work;
 
-bool IsWorkOver() { return t_work_end.has_value() && WorkClock::now() >= *t_work_end; }
+std::atomic<size_t> g_held{0};  ///< by all
 
-int StopWhenOver(void*) { return IsWorkOver() ? 1 : 0; }
+int StopWhenOver(void*) { return WorkLimit::IsOver() ? 1 : 0; }
 
 }  // namespace
 
-WorkLimit::WorkLimit(std::chrono::milliseconds longest) { t_work_end = WorkClock::now() + longest; }
-
-WorkLimit::~WorkLimit() { t_work_end.reset(); }
-
-void WorkLimit::Check() {
-  if (IsWorkOver()) Fail();
+WorkLimit::WorkLimit(std::chrono::milliseconds longest) {
+  t_work = {};
+  t_work.limited = true;
+  t_work.end = WorkClock::now() + longest;
 }
 
-void WorkLimit::Fail() { throw Error(Error::kEngineUserBusy, "this search takes too long; narrow it"); }
+WorkLimit::~WorkLimit() {
+  g_held -= t_work.held;
+  t_work = {};
+}
+
+bool WorkLimit::IsOver() { return t_work.limited && (t_work.refused != 0 || WorkClock::now() >= t_work.end); }
+
+void WorkLimit::Check() {
+  if (IsOver()) Fail();
+}
+
+void WorkLimit::Fail() {
+  if (t_work.refused == Error::kEngineBusyMemory) {
+    throw Error(Error::kEngineBusyMemory, "the engine is short of memory; ask again later");
+  }
+  throw Error(Error::kEngineUserBusy, t_work.refused != 0 ? "this search takes too much memory; narrow it"
+                                                          : "this search takes too long; narrow it");
+}
 
 void WorkLimit::Apply(sqlite3* connection) {
-  const bool is_limited = t_work_end.has_value();
+  const bool is_limited = t_work.limited;
   sqlite3_progress_handler(connection, is_limited ? kStepsBetweenLooks : 0, is_limited ? &StopWhenOver : nullptr,
                            nullptr);
+  ObeyWorkLimit(connection, is_limited);
+}
+
+/// What a request has of its own is looked at first: that it has too much follows from the request alone.
+bool WorkLimit::Hold(size_t bytes) {
+  if (!t_work.limited) return true;
+  if (t_work.refused != 0) return false;
+  if (bytes > MemoryOfAll() / 2 - t_work.held) {
+    t_work.refused = Error::kEngineUserBusy;
+  } else if (g_held.fetch_add(bytes) + bytes > MemoryOfAll()) {
+    g_held -= bytes;
+    t_work.refused = Error::kEngineBusyMemory;
+  } else {
+    t_work.held += bytes;
+  }
+  return t_work.refused == 0;
+}
+
+void WorkLimit::Release(size_t bytes) {
+  const size_t released = std::min(bytes, t_work.held);
+  t_work.held -= released;
+  g_held -= released;
+}
+
+void WorkLimit::Require(size_t bytes) {
+  if (!Hold(bytes)) Fail();
+}
+
+size_t WorkLimit::MemoryOfAll() {
+  static const auto most = [] {
+    const long pages = sysconf(_SC_PHYS_PAGES), page_size = sysconf(_SC_PAGE_SIZE);
+    const uint64_t host =
+        pages > 0 && page_size > 0 ? static_cast<uint64_t>(pages) * static_cast<uint64_t>(page_size) : kMemoryMost * 8;
+    return static_cast<size_t>(std::min(kMemoryMost, host / 8));
+  }();
+  return most;
 }
 
 }  // namespace ferrox::engine

@@ -3,24 +3,39 @@
 #include <sqlite3.h>
 
 #include <chrono>
+#include <cstddef>
 
 namespace ferrox::engine {
 
-/// Bounds how long the calling thread works for one request. Reading connections that it borrows meanwhile stop in the
-/// middle of a statement; what takes long without one asks Check. Nothing is bounded without such a scope.
+/// Bounds how long the calling thread works for one request, and how much memory the large lists of all such requests
+/// have together. Reading connections that it borrows meanwhile stop in the middle of a statement, or at the next page
+/// that they read; what takes long without either asks Check. Nothing is bounded without such a scope.
 class WorkLimit {
  public:
   explicit WorkLimit(std::chrono::milliseconds longest);
   WorkLimit(const WorkLimit&) = delete;
   WorkLimit& operator=(const WorkLimit&) = delete;
+  /// Gives back what the request still holds.
   ~WorkLimit();
 
-  /// @throws Error kEngineUserBusy when the time is over.
+  /// @throws Error, as Fail does, when the time is over or memory was refused.
   static void Check();
+  /// Whether Check would throw.
+  static bool IsOver();
+  /// @throws Error kEngineUserBusy; kEngineBusyMemory when other requests have the memory.
   [[noreturn]] static void Fail();
   /// Has the connection's statements stop with SQLITE_INTERRUPT when the calling thread's time is over; lets them run
   /// on when the thread has no limit.
   static void Apply(sqlite3* connection);
+
+  /// Counts bytes that the request is about to hold, until Release or its end: at most MemoryOfAll for all requests
+  /// with a limit, half of that for each. When that is not so, the request is over. @return whether it may go on.
+  static bool Hold(size_t bytes);
+  static void Release(size_t bytes);
+  /// Hold, or Fail.
+  static void Require(size_t bytes);
+  /// 256 MiB, or an eighth of the host's memory where that is less.
+  static size_t MemoryOfAll();
 };
 
 }  // namespace ferrox::engine
