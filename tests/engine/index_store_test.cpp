@@ -136,7 +136,7 @@ TEST_F(IndexStoreTest, OfADeletedFolderNothingIsSeenFromTheCommitOn) {
     store_->Commit();
     if (store_->Uncleared() == 1) Reopen();
   }
-  EXPECT_EQ(std::vector<std::string>{"boats"}, Find(*store_, "baots").suggestions);
+  EXPECT_EQ(std::vector<std::string>{"boats"}, Find(*store_, "\"baots\"").suggestions);
 }
 
 TEST_F(IndexStoreTest, DocumentsAreFoundByAllTheirParts) {
@@ -345,7 +345,7 @@ TEST_F(IndexStoreTest, NumbersOfFieldsAreFoundByRange) {
 
 TEST_F(IndexStoreTest, BetterHitsComeFirst) {
   Put("/v/mentions.txt", "a long text with many words and one lonely turbine in it " + std::string(4000, '.'));
-  Put("/v/about.txt", "turbine turbine turbine and its blades");
+  Put("/v/about.txt", "Blades\n\nturbine turbine turbine and its blades");
   Put("/v/turbine.txt", "a drawing");
   store_->Commit();
   EXPECT_EQ(Paths(Find(*store_, "turbine"), false), "/v/turbine.txt\n/v/about.txt\n/v/mentions.txt");

@@ -102,17 +102,38 @@ std::string ReplyText(const SearchReply& reply) {
          << hit.stamp << "|" << hit.is_folder << "|" << toString(hit.fields) << "\n";
   }
   for (const std::string& word : reply.suggestions) text << "? " << word << "\n";
+  for (const std::string& word : reply.ignored) text << "- " << word << "\n";
+  for (const RepairedWord& word : reply.repaired) text << word.from << " > " << word.to << word.also << "\n";
+  text << reply.total_all.value_or(-1) << reply.none_has_all;
   return text.str();
 }
 
-const std::vector<std::string> kQueries = {"alpha",          "date:>1990",     "bridge",
-                                           "alpha beta",     "alpha OR gamma", "-alpha",
-                                           "\"alpha beta\"", "brid*",          "title:bridge",
-                                           "name:alpha1",    "ext:txt -beta",  "kind:folder",
-                                           "size:>20",       "date:>2020",     "path:/v/share",
-                                           "path:/v",        "secret",         "alpha -path:/v/share/folder1.txt",
-                                           "gamma*",         "alfa",           "omega size:0..30",
-                                           "bridgs",         "secre",          "alpha (beta OR secret)"};
+const std::vector<std::string> kQueries = {"alpha",
+                                           "date:>1990",
+                                           "bridge",
+                                           "alpha beta",
+                                           "alpha OR gamma",
+                                           "-alpha",
+                                           "\"alpha beta\"",
+                                           "brid*",
+                                           "title:bridge",
+                                           "name:alpha1",
+                                           "ext:txt -beta",
+                                           "kind:folder",
+                                           "size:>20",
+                                           "date:>2020",
+                                           "path:/v/share",
+                                           "path:/v",
+                                           "secret",
+                                           "alpha -path:/v/share/folder1.txt",
+                                           "gamma*",
+                                           "alfa",
+                                           "omega size:0..30",
+                                           "bridgs",
+                                           "secre",
+                                           "alpha (beta OR secret)",
+                                           "alpha bridge secret",
+                                           "bridge alhpa omega"};
 
 class TrimmingTest : public testing::Test {
  protected:
@@ -153,7 +174,7 @@ TEST_F(TrimmingTest, RepliesAreAFunctionOfWhatTheAskerMayRead) {
     Json::Value document = files.at(order[i]).document;
     if (i % 7 == 0) document["_KOVAAccess"] = i % 2 == 0 ? "0:0:0700" : "0:0:0777";
     if (!IsReadable(files, order[i]) && !document["KOVAMDIsDir"].asBool()) {
-      document["KOVAMDTextContent"] = "secret secret bridgse alpha omega " + random.Text(200);
+      document["KOVAMDTextContent"] = "secret secret brdiges alpha omega " + random.Text(200);
     }
     changed.store.Upsert(order[i], document);
     if (i % 50 == 0) changed.store.Upsert("/v/share/gone/" + std::to_string(i), FileDocument("/gone", "alpha"));
@@ -199,8 +220,10 @@ TEST_F(TrimmingTest, RepliesAreAFunctionOfWhatTheAskerMayRead) {
   changed.store.Commit();
   EXPECT_EQ(std::ssize(readable), Ask(changed.store, "date:>1990").total);
   EXPECT_EQ(0, Ask(changed.store, "secret").total);
-  const SearchReply near = Ask(changed.store, "bridgse");
-  EXPECT_EQ(near.suggestions, (std::vector<std::string>{"bridge", "bridges"}));
+  const SearchReply near = Ask(changed.store, "brdiges");
+  ASSERT_FALSE(near.repaired.empty());
+  for (const RepairedWord& word : near.repaired) EXPECT_TRUE(word.to.starts_with("bridge")) << word.to;
+  EXPECT_EQ(Ask(changed.store, "\"brdiges\"").suggestions, (std::vector<std::string>{"bridges", "bridge"}));
   EXPECT_GT(Find(changed.store, "secret").total, 500);
 }
 

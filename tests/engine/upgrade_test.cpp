@@ -50,10 +50,11 @@ class UpgradeTest : public EngineTest {
     std::string answers;
     for (const char* text :
          {"boats", "harbour OR notes", "name:photo", "bo*", "-boats", "kind:folder", "path:/v/photo",
-          "boats path:/v/photo/2023", "path:/", "path:/v/photo/notes.txt", "ext:txt boats", "boat"}) {
+          "boats path:/v/photo/2023", "path:/", "path:/v/photo/notes.txt", "ext:txt boats", "\"boat\""}) {
       const QueryNode query = ParseQuery(text, 1718000000);
       SearchRequest request;
       request.query = &query;
+      request.sort = SortKey::kName;
       for (const SearchHit& hit : index.Search(request).hits)
         answers += hit.path + " " + hit.snippet + toString(hit.fields) + "\n";
       answers += std::string("= ") + text + "\n";

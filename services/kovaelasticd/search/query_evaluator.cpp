@@ -1,8 +1,8 @@
 #include "services/kovaelasticd/search/query_evaluator.h"
 
 #include <algorithm>
-#include <cmath>
 #include <string_view>
+#include <utility>
 
 #include "fileindex/util.h"
 #include "services/kovaelasticd/search/path_condition.h"
@@ -17,8 +17,6 @@ namespace {
 
 /// A condition is checked document by document when there are no more of them.
 constexpr int64_t kCheckOneByOneMax = 2000;
-/// Of a word that is looked for within names, the first so many groups of three characters are compared.
-constexpr size_t kGramsMax = 32;
 
 bool IsWords(QueryNode::Type type) {
   return type == QueryNode::Type::kText || type == QueryNode::Type::kField || type == QueryNode::Type::kName;
@@ -33,20 +31,67 @@ int32_t KindOfExtension(const std::string& ext) {
   return static_cast<int32_t>(fileindex::GetFileTypeByFullPath("." + ext));
 }
 
-/// The expression for a part of a name; "" for fewer than three characters.
-std::string GramExpression(const std::string& text) {
-  const std::vector<std::string> grams = Trigrams(text, kGramsMax);
-  return grams.empty() ? std::string() : "{grams} : " + PhraseExpression(grams, false);
-}
+/// A plain word that documents may lack, when it stands at the top of the query or is joined there with others by AND.
+bool IsSoft(const QueryNode& node) { return node.type == QueryNode::Type::kText && !node.required; }
 
-/// Joins full-text expressions, of which either may be "".
-void AppendOr(std::string& expression, const std::string& alternative) {
-  if (alternative.empty()) return;
-  if (!expression.empty()) expression += " OR ";
-  expression += "(" + alternative + ")";
+std::vector<const QueryNode*> SoftNodes(const QueryNode& query) {
+  std::vector<const QueryNode*> soft;
+  if (IsSoft(query)) soft.push_back(&query);
+  if (query.type != QueryNode::Type::kAnd) return soft;
+  for (const QueryNode& child : query.children) {
+    if (IsSoft(child)) soft.push_back(&child);
+  }
+  return soft;
 }
 
 }  // namespace
+
+FoundDocuments QueryEvaluator::Find(const QueryNode& query, bool all_words) {
+  const std::vector<const QueryNode*> soft = SoftNodes(query);
+  if (!soft.empty()) return FindSoftly(query, soft, all_words);
+  FoundDocuments found;
+  found.documents = Evaluate(query, true);
+  return found;
+}
+
+/// What the strict part of the query finds, cut down to the documents with one of the soft words that count.
+FoundDocuments QueryEvaluator::FindSoftly(const QueryNode& query, const std::vector<const QueryNode*>& soft,
+                                          bool all_words) {
+  FoundDocuments found;
+  const bool has_strict = query.type == QueryNode::Type::kAnd && soft.size() < query.children.size();
+  if (has_strict) found.documents = EvaluateAll(query, true, true);
+  soft_.Find(soft, HasRareWord());
+  for (const QueryNode* node : soft) NoteWords(*node);
+  DocSet any = soft_.Any();
+  if (has_strict && soft_.AnyCounts()) found.documents.IntersectWith(any);
+  if (!has_strict) found.documents = std::move(any);
+  if (soft.size() > 1 || !soft_.AnyCounts()) {
+    found.with_all = found.documents;
+    soft_.KeepAll(*found.with_all);
+  }
+  const int64_t total = found.documents.Count();
+  const int64_t with_all = found.with_all.has_value() ? found.with_all->Count() : total;
+  if (with_all == total) found.with_all.reset();
+  if (all_words && with_all > 0) {
+    if (found.with_all.has_value()) found.documents = *std::exchange(found.with_all, std::nullopt);
+  } else {
+    found.none_has_all = all_words && total > 0;
+    found.ignored = soft_.Ignored();
+  }
+  found.repaired = soft_.Repaired();
+  for (RankedWord& word : soft_.TakeRanked()) {
+    for (const std::string& other : word.repairs) found_words_.marked.push_back({other, false});
+    found_words_.ranked.push_back(std::move(word));
+  }
+  return found;
+}
+
+/// Whether one of the required words is.
+bool QueryEvaluator::HasRareWord() const {
+  return std::any_of(found_words_.ranked.begin(), found_words_.ranked.end(), [this](const RankedWord& word) {
+    return word.documents > 0 && word.documents <= visible_.Documents() / constants_.common_part;
+  });
+}
 
 DocSet QueryEvaluator::Evaluate(const QueryNode& node, bool ranking) {
   WorkLimit::Check();
@@ -71,8 +116,8 @@ DocSet QueryEvaluator::Evaluate(const QueryNode& node, bool ranking) {
 }
 
 /// Words first, since they leave the fewest documents; then what AND and OR join; conditions on columns after that,
-/// which few documents can be checked for one by one; and exclusions last.
-DocSet QueryEvaluator::EvaluateAll(const QueryNode& node, bool ranking) {
+/// which few documents can be checked for one by one; and exclusions last. `without_soft` leaves the soft words out.
+DocSet QueryEvaluator::EvaluateAll(const QueryNode& node, bool ranking, bool without_soft) {
   DocSet found;
   bool any = false;
   const auto intersect = [&](const QueryNode& child) {
@@ -84,7 +129,7 @@ DocSet QueryEvaluator::EvaluateAll(const QueryNode& node, bool ranking) {
     any = true;
   };
   for (const QueryNode& child : node.children) {
-    if (IsWords(child.type)) intersect(child);
+    if (IsWords(child.type) && !(without_soft && IsSoft(child))) intersect(child);
   }
   for (const QueryNode& child : node.children) {
     if (child.type == QueryNode::Type::kAnd || child.type == QueryNode::Type::kOr) intersect(child);
@@ -180,57 +225,34 @@ bool QueryEvaluator::MatchesFilter(int64_t id, const QueryNode& filter) {
   }
 }
 
-/// Runs the full-text expressions for a word, phrase or beginning of a word. kText looks into the content, the name,
-/// the title and the searchable fields; kField into the named fields, whose words are stored with the field's name
-/// before them; kName into names. A plain word is also looked for within names, by its groups of three characters.
-void QueryEvaluator::CollectWords(const QueryNode& node, HitCollector& content, HitCollector& meta) {
-  const QueryWords words = SplitQueryText(node.text, node.prefix);
-  const std::string phrase = PhraseExpression(words.words, words.prefix);
-  std::string meta_expression;
-  bool in_content = node.type == QueryNode::Type::kText;
-  if (node.type == QueryNode::Type::kField) {
-    for (const std::string& name : node.fields) {
-      if (name == field::kTextContent) {
-        in_content = true;
-        continue;
-      }
-      if (name == field::kTitle) {  // and the title that the text has
-        AppendOr(meta_expression, "{title} : " + phrase);
-        continue;
-      }
-      std::vector<std::string> marked = words.words;
-      for (std::string& word : marked) word.insert(0, name + kFieldEnd);
-      AppendOr(meta_expression, "{fields} : " + PhraseExpression(marked, words.prefix));
-    }
-  } else {
-    const bool names_only = node.type == QueryNode::Type::kName;
-    AppendOr(meta_expression, (names_only ? "{name} : " : "{name title text} : ") + phrase);
-    if (names_only || !node.phrase) AppendOr(meta_expression, GramExpression(node.text));
+/// The documents with a word, phrase or beginning of a word; with `ranking` also its hits, and what snippets mark.
+/// kText looks into the content, the name, the title and the searchable fields; kField into the named fields; kName
+/// into names. A plain word is also looked for within names, by its groups of three characters; and in other forms,
+/// unless it is behind a NOT.
+DocSet QueryEvaluator::EvaluateWords(const QueryNode& node, bool ranking) {
+  TermCollector found(database_, visible_, ranking ? hits_max_ : 0);
+  const std::vector<WordForm> forms = FormsOf(node, ranking, constants_);
+  found.Collect(forms);
+  const bool in_names = node.type == QueryNode::Type::kName;
+  if (in_names || (node.type == QueryNode::Type::kText && !node.phrase)) found.CollectNameParts(node.text);
+  if (ranking) {
+    RankedWord& word = found_words_.ranked.emplace_back(RankedWord{FoldText(node.text)});
+    word.letters = CountLetters(word.word);
+    word.documents = found.Documents();
+    word.rarity = Rarity(visible_.Documents(), word.documents);
+    word.hits = found.TakeHits();
+    word.phrases = PhrasesOf(forms);
+    NoteWords(node);
   }
-  if (in_content) Collect(database_, "content_fts", phrase, words.prefix, content);
-  if (!meta_expression.empty()) Collect(database_, "meta_fts", meta_expression, words.prefix, meta);
+  return found.Set();
 }
 
-/// The documents with these words; with `ranking` also their hits, what they weigh, and what snippets mark.
-DocSet QueryEvaluator::EvaluateWords(const QueryNode& node, bool ranking) {
-  HitCollector content(hits_max_, visible_);
-  HitCollector meta(hits_max_, visible_);
-  CollectWords(node, content, meta);
-  DocSet found = content.TakeSet();
-  found.UniteWith(meta.Set());
-  if (ranking) {
-    RankedWord term;
-    term.weight = std::log(1.0 + static_cast<double>(visible_.Documents()) / static_cast<double>(1 + found.Count()));
-    term.content = content.TakeHits();
-    term.meta = meta.TakeHits();
-    found_words_.ranked.push_back(std::move(term));
-    const QueryWords words = SplitQueryText(node.text, node.prefix);
-    for (const std::string& word : words.words) {
-      found_words_.marked.push_back({word, words.prefix && &word == &words.words.back()});
-      found_words_.looked_for.push_back(word);
-    }
+void QueryEvaluator::NoteWords(const QueryNode& node) {
+  const QueryWords words = SplitQueryText(node.text, node.prefix);
+  for (const std::string& word : words.words) {
+    found_words_.marked.push_back({word, words.prefix && &word == &words.words.back()});
+    found_words_.looked_for.push_back(word);
   }
-  return found;
 }
 
 }  // namespace ferrox::engine

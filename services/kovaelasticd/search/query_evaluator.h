@@ -1,30 +1,29 @@
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
+#include <optional>
 #include <string>
 #include <vector>
 
 #include "services/kovaelasticd/query/query.h"
+#include "services/kovaelasticd/search/ranked_word.h"
+#include "services/kovaelasticd/search/ranking_constants.h"
+#include "services/kovaelasticd/search/soft_words.h"
 #include "services/kovaelasticd/store/doc_set.h"
-#include "services/kovaelasticd/store/fts.h"
+#include "services/kovaelasticd/store/index_store.h"
 #include "services/kovaelasticd/store/store_reader.h"
 #include "services/kovaelasticd/store/visible.h"
-#include "services/kovaelasticd/text/snippet.h"
 
 namespace ferrox::engine {
 
-/// A word or phrase of a query that documents are ranked by, and where it was found.
-struct RankedWord {
-  double weight = 0;             ///< ln(1 + all documents / documents that have it): the rarer, the more
-  std::vector<WordHit> content;  ///< in ascending order of documents; those of several expressions follow each other
-  std::vector<WordHit> meta;
-};
-
-/// The words of a query, apart from those behind NOT.
-struct FoundWords {
-  std::vector<RankedWord> ranked;
-  std::vector<std::string> looked_for;  ///< folded, for other spellings
-  std::vector<SnippetWord> marked;      ///< for snippets
+/// What a query finds.
+struct FoundDocuments {
+  DocSet documents;
+  std::optional<DocSet> with_all;    ///< of these, those with all words; nothing where all have them
+  std::vector<std::string> ignored;  ///< as in SearchReply, like the next two
+  std::vector<RepairedWord> repaired;
+  bool none_has_all = false;
 };
 
 /// Finds the documents that a query asks for, as sets of document numbers: one bit for each document of the index, so
@@ -32,29 +31,39 @@ struct FoundWords {
 class QueryEvaluator {
  public:
   /// `hits_max`: of how many documents each word's hits are kept for ranking (HitCollector); the sets are complete in
-  /// any case. Nothing that is not `visible` is found, or counts. Both must outlive this.
-  QueryEvaluator(StoreReader& reader, const Visible& visible, size_t hits_max)
-      : reader_(reader), database_(reader.database), visible_(visible), hits_max_(hits_max) {}
+  /// any case. Nothing that is not `visible` is found, or counts. All must outlive this.
+  QueryEvaluator(StoreReader& reader, const Visible& visible, size_t hits_max, const RankingConstants& constants)
+      : reader_(reader),
+        database_(reader.database),
+        visible_(visible),
+        hits_max_(hits_max),
+        constants_(constants),
+        soft_(reader, visible, hits_max, constants) {}
 
+  /// `all_words`: documents must have all words, unless there is none that does. To be called once.
   /// @throws Error kEngineStorage.
-  DocSet Evaluate(const QueryNode& query) { return Evaluate(query, true); }
+  FoundDocuments Find(const QueryNode& query, bool all_words);
   /// Of all that was evaluated.
   const FoundWords& Words() const { return found_words_; }
 
  private:
   // `ranking`: words found count for the order of the documents; they do not below a NOT.
   DocSet Evaluate(const QueryNode& node, bool ranking);
-  DocSet EvaluateAll(const QueryNode& node, bool ranking);
+  DocSet EvaluateAll(const QueryNode& node, bool ranking, bool without_soft = false);
   DocSet EvaluateWords(const QueryNode& node, bool ranking);
   DocSet EvaluateFilter(const QueryNode& node);
   void ApplyFilter(DocSet& documents, const QueryNode& filter, bool wanted);
   bool MatchesFilter(int64_t id, const QueryNode& filter);
-  void CollectWords(const QueryNode& node, HitCollector& content, HitCollector& meta);
+  FoundDocuments FindSoftly(const QueryNode& query, const std::vector<const QueryNode*>& soft, bool all_words);
+  bool HasRareWord() const;
+  void NoteWords(const QueryNode& node);
 
   StoreReader& reader_;
   Database& database_;
   const Visible& visible_;
   const size_t hits_max_;
+  const RankingConstants& constants_;
+  SoftWords soft_;
   FoundWords found_words_;
 };
 

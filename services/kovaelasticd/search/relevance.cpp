@@ -3,10 +3,11 @@
 #include <algorithm>
 #include <iterator>
 #include <numeric>
+#include <string_view>
 #include <tuple>
 #include <utility>
 
-#include "common/clock.h"
+#include "services/kovaelasticd/store/fts.h"
 #include "services/kovaelasticd/store/work_limit.h"
 
 namespace ferrox::engine {
@@ -18,35 +19,32 @@ namespace {
 /// and dates of the one to three blocks that it touches, about 1 ms each.
 constexpr size_t kCloseBlock = 500;
 
-/// What a word's places beside the content add to the score, in the measure of CountValue. The values are set by hand:
-/// a word in the name outweighs any number of occurrences in a text.
-double PlaceValue(uint8_t places) {
-  double value = 0;
-  if ((places & kInName) != 0) value += 2.5;
-  if ((places & (kInName | kInNamePart)) == kInNamePart) value += 1.0;
-  if ((places & kInTitle) != 0) value += 1.5;
-  if ((places & kInText) != 0) value += 0.8;
-  return value;
+/// Finds the hits of a word among the candidates, both in the order of documents, by walking through both once; calls
+/// `take` with the candidate and the hit.
+template <typename Candidate, typename Take>
+void ForEachCandidateHit(std::vector<Candidate>& candidates, const std::vector<TermHit>& hits, Take take) {
+  size_t place = 0;
+  for (const TermHit& hit : hits) {
+    while (place < candidates.size() && candidates[place].id < hit.id) ++place;
+    if (place == candidates.size()) return;
+    if (candidates[place].id == hit.id) take(candidates[place], hit);
+  }
 }
-
-/// What ages count from, in seconds since the epoch: the same all day, so that pages asked one after the other agree.
-int64_t EndOfDay() { return (Clock::Get().Now() / kDaySec + 1) * kDaySec; }
-
-/// What a word's occurrences in the content add to the score: the term of BM25, with k1 = 1.2, which nears 2.2 with
-/// many occurrences; the longer the text, the more are needed for the same.
-double CountValue(uint8_t count, double length_factor) { return count * 2.2 / (count + 1.2 * length_factor); }
 
 }  // namespace
 
 RelevanceRanking::RelevanceRanking(StoreReader& reader, const Visible& visible, const std::vector<RankedWord>& words,
-                                   size_t ranked_max)
+                                   const SearchRequest& request, const RankingConstants& constants)
     : database_(reader.database),
       visible_(visible),
       ties_(reader, visible),
       words_(words),
       average_text_(std::max(
           1.0, static_cast<double>(visible.TextBytes()) / std::max(1.0, static_cast<double>(visible.WithContent())))),
-      ranked_max_(ranked_max) {}
+      ranked_max_(request.ranked_max),
+      value_(constants),
+      nearness_(reader.database, words, constants),
+      priors_(reader, *request.query) {}
 
 /// The documents to rank: all; or, with more than ranked_max_ of them, those added last (for an asker those with the
 /// least PathKeys) and all that have a word in their name, title or fields. `bounded` becomes whether some were left
@@ -61,7 +59,9 @@ std::vector<RelevanceRanking::Candidate> RelevanceRanking::Candidates(const DocS
   DocSet by_name;
   if (bounded) {
     for (const RankedWord& word : words_) {
-      for (const WordHit& hit : word.meta) by_name.Add(hit.id);
+      for (const TermHit& hit : word.hits) {
+        if ((hit.places | hit.other_places) != 0) by_name.Add(hit.id);
+      }
     }
   }
   const bool by_key = bounded && visible_.IsForAsker();
@@ -74,54 +74,23 @@ std::vector<RelevanceRanking::Candidate> RelevanceRanking::Candidates(const DocS
   int64_t place = 0;
   documents.ForEach([&](int64_t id) {
     const bool is_among = by_key ? visible_.PathKey(id) <= bound : place++ >= skip;
-    if (is_among || by_name.Contains(id)) candidates.push_back({id, 0, 0});
+    if (is_among || by_name.Contains(id)) candidates.push_back({id, 0});
     return true;
   });
   return candidates;
 }
 
-/// The length of the document's text in averages of the index, damped: 0.3 for none, 1 for the average. `freshness`
-/// becomes what its age adds to the score: 0.3 for a file changed today, half of that for one of 180 days.
-double RelevanceRanking::LengthFactor(int64_t id, double& freshness) {
-  Statement statement = database_.Prepare("SELECT text_bytes, mtime FROM docs WHERE id = ?1");
-  statement.Bind(1, id);
-  freshness = 0;
-  if (!statement.Step()) return 1;
-  const double age_days = std::max(0.0, static_cast<double>(EndOfDay() - statement.Int(1)) / kDaySec);
-  freshness = 0.3 / (1 + age_days / 180);
-  return 0.3 + 0.7 * static_cast<double>(statement.Int(0)) / average_text_;
-}
-
-/// Finds the hits of a word among the candidates, which are in the order of their numbers as the hits of each
-/// expression are, by walking through both once; calls `take` with the candidate's place and the hit.
-template <typename Take>
-void RelevanceRanking::ForEachCandidateHit(const std::vector<Candidate>& candidates, const std::vector<WordHit>& hits,
-                                           Take take) {
-  size_t place = 0;
-  int64_t before = 0;
-  for (const WordHit& hit : hits) {
-    if (hit.id < before) place = 0;  // the hits of the next phrase begin
-    before = hit.id;
-    while (place < candidates.size() && candidates[place].id < hit.id) ++place;
-    if (place < candidates.size() && candidates[place].id == hit.id) take(place, hit);
-  }
-}
-
-/// Scores all candidates by the words' hits alone, without reading a row: texts count as of average length. `counts`
-/// becomes the words' occurrences in the content, candidate by candidate.
-void RelevanceRanking::ScoreQuickly(std::vector<Candidate>& candidates, std::vector<uint8_t>& counts) const {
-  counts.assign(candidates.size() * words_.size(), 0);
-  for (size_t t = 0; t < words_.size(); ++t) {
-    const double weight = words_[t].weight;
-    ForEachCandidateHit(candidates, words_[t].content, [&](size_t place, const WordHit& hit) {
-      counts[place * words_.size() + t] = hit.count;
-      candidates[place].score += static_cast<float>(weight * CountValue(hit.count, 1));
+/// Scores all candidates by the words' hits alone, without reading a row: texts count as of average length.
+void RelevanceRanking::ScoreQuickly(std::vector<Candidate>& candidates) const {
+  for (const RankedWord& word : words_) {
+    ForEachCandidateHit(candidates, word.hits, [&](Candidate& candidate, const TermHit& hit) {
+      candidate.score += static_cast<float>(value_.Of(word, hit, DocumentShape()));
     });
-    ForEachCandidateHit(candidates, words_[t].meta, [&](size_t place, const WordHit& hit) {
-      const auto value = static_cast<float>(weight * PlaceValue(hit.places));
-      candidates[place].score += value;
-      candidates[place].place_score += value;
-    });
+    const auto by_folder = static_cast<float>(value_.OfFolder(word));
+    if (word.folders.SizeBytes() == 0) continue;
+    for (Candidate& candidate : candidates) {
+      if (word.folders.Contains(candidate.id)) candidate.score += by_folder;
+    }
   }
 }
 
@@ -134,9 +103,9 @@ std::vector<uint64_t> RelevanceRanking::Keys(const std::vector<Candidate>& candi
   return keys;
 }
 
-/// The places of the candidates that stand from `begin` to `end` in the order of the quick score, in no order.
-std::vector<size_t> RelevanceRanking::PlacesBetween(const std::vector<Candidate>& candidates,
-                                                    const std::vector<uint64_t>& keys, size_t begin, size_t end) {
+/// The candidates that stand from `begin` to `end` in the order of the quick score, in no order.
+std::vector<int64_t> RelevanceRanking::DocumentsBetween(const std::vector<Candidate>& candidates,
+                                                        const std::vector<uint64_t>& keys, size_t begin, size_t end) {
   std::vector<size_t> places(candidates.size());
   std::iota(places.begin(), places.end(), size_t{0});
   const auto better = [&](size_t a, size_t b) {
@@ -147,31 +116,64 @@ std::vector<size_t> RelevanceRanking::PlacesBetween(const std::vector<Candidate>
   const auto last = places.begin() + static_cast<ptrdiff_t>(end);
   if (last != places.end()) std::nth_element(places.begin(), last, places.end(), better);
   if (first != last) std::nth_element(places.begin(), first, last, better);
-  return {first, last};
+  std::vector<int64_t> documents;
+  for (auto place = first; place != last; ++place) documents.push_back(candidates[*place].id);
+  return documents;
 }
 
-/// The score with the length of the text and its age, for which the document's row is read.
-double RelevanceRanking::CloseScore(const Candidate& candidate, const uint8_t* counts) {
-  double score = 0;
-  const double length = LengthFactor(candidate.id, score);
-  score += static_cast<double>(candidate.place_score);
-  for (size_t t = 0; t < words_.size(); ++t) {
-    if (counts[t] > 0) score += words_[t].weight * CountValue(counts[t], length);
+/// What the document's row tells: its length, and the letters of its name without the extension. Returns what it is
+/// worth whatever the words are.
+double RelevanceRanking::ReadRow(int64_t id, DocumentShape& shape, size_t& name_letters,
+                                 std::vector<ScorePart>* parts) {
+  Statement statement = database_.Prepare("SELECT text_bytes, mtime, folder, kind, ext, name FROM docs WHERE id = ?1");
+  name_letters = 0;
+  if (!statement.Bind(1, id).Step()) return 0;
+  RankedRow row;
+  row.mtime = statement.Int(1);
+  row.folder = statement.Int(2);
+  row.kind = static_cast<int32_t>(statement.Int(3));
+  row.ext = statement.Text(4);
+  const std::string_view name = statement.Text(5);
+  name_letters = CountLetters(name.substr(0, name.size() - std::min(name.size(), row.ext.size())));
+  shape.length = value_.Length(static_cast<double>(statement.Int(0)) / average_text_);
+  return priors_.Of(row, parts);
+}
+
+/// The score without nearness; to `parts`, unless null, what it is made of.
+double RelevanceRanking::CloseScore(int64_t id, std::vector<ScorePart>* parts) {
+  DocumentShape shape;
+  size_t name_letters = 0;
+  double score = ReadRow(id, shape, name_letters, parts);
+  std::vector<std::pair<const RankedWord*, const TermHit*>> hits;
+  size_t letters = 0;
+  for (const RankedWord& word : words_) {
+    const auto before = [](const TermHit& hit, int64_t document) { return hit.id < document; };
+    const auto hit = std::lower_bound(word.hits.begin(), word.hits.end(), id, before);
+    if (hit != word.hits.end() && hit->id == id) {
+      hits.emplace_back(&word, &*hit);
+      if (((hit->places | hit->other_places) & kInName) != 0) letters += word.letters;
+    }
+    if (!word.folders.Contains(id)) continue;
+    score += value_.OfFolder(word);
+    if (parts != nullptr) parts->push_back({word.word, "folder", value_.OfFolder(word)});
+  }
+  shape.of_name =
+      name_letters == 0 ? 0 : std::min(1.0, static_cast<double>(letters) / static_cast<double>(name_letters));
+  for (const auto& [word, hit] : hits) {
+    score += value_.Of(*word, *hit, shape);
+    if (parts != nullptr) value_.Explain(*word, *hit, shape, *parts);
   }
   return score;
 }
 
-/// The block of candidates at these places, sorted by the close score; only what stands from `begin` to `end` in it is
-/// wanted.
-std::vector<RankedDocument> RelevanceRanking::RankBlock(const std::vector<Candidate>& candidates,
-                                                        const std::vector<uint8_t>& counts,
-                                                        const std::vector<size_t>& places, size_t begin, size_t end) {
+/// The block of documents sorted by the close score; only what stands from `begin` to `end` in it is wanted.
+std::vector<RankedDocument> RelevanceRanking::RankBlock(std::vector<int64_t> documents, size_t begin, size_t end) {
+  std::sort(documents.begin(), documents.end());
+  const std::vector<double> near = nearness_.Of(documents);
   std::vector<RankedDocument> ranked;
-  ranked.reserve(places.size());
-  for (const size_t place : places) {
-    RankedDocument entry(candidates[place].id);
-    entry.score = CloseScore(candidates[place], counts.data() + place * words_.size());
-    ranked.push_back(std::move(entry));
+  ranked.reserve(documents.size());
+  for (size_t i = 0; i < documents.size(); ++i) {
+    ranked.emplace_back(documents[i]).score = CloseScore(documents[i], nullptr) + near[i];
   }
   const auto better = [](const RankedDocument& a, const RankedDocument& b) { return a.score > b.score; };
   std::sort(ranked.begin(), ranked.end(), better);
@@ -184,12 +186,20 @@ std::vector<RankedDocument> RelevanceRanking::RankBlock(const std::vector<Candid
   return {std::make_move_iterator(ranked.begin() + static_cast<ptrdiff_t>(begin)), std::make_move_iterator(wanted)};
 }
 
+std::vector<ScorePart> RelevanceRanking::Explain(int64_t id) {
+  std::vector<ScorePart> parts;
+  (void)CloseScore(id, &parts);
+  const double near = nearness_.Of({id}).front();
+  if (near > 0) parts.push_back({"words close together", "", near});
+  std::stable_sort(parts.begin(), parts.end(), [](const ScorePart& a, const ScorePart& b) { return a.adds > b.adds; });
+  return parts;
+}
+
 /// The page itself: of all candidates, best first, those from `offset` on; the other way round, counted from the end.
 std::vector<RankedDocument> RelevanceRanking::Page(const DocSet& documents, int64_t total, const PageOrder& order,
                                                    bool& bounded) {
   std::vector<Candidate> candidates = Candidates(documents, total, bounded);
-  std::vector<uint8_t> counts;
-  ScoreQuickly(candidates, counts);
+  ScoreQuickly(candidates);
   const std::vector<uint64_t> keys = Keys(candidates);
   const size_t count = candidates.size();
   size_t begin = std::min(count, order.begin);
@@ -197,9 +207,9 @@ std::vector<RankedDocument> RelevanceRanking::Page(const DocSet& documents, int6
   if (order.ascending) std::tie(begin, end) = std::make_pair(count - end, count - begin);
   std::vector<RankedDocument> page;
   for (size_t block = begin / kCloseBlock * kCloseBlock; block < end; block += kCloseBlock) {
-    const std::vector<size_t> places = PlacesBetween(candidates, keys, block, std::min(count, block + kCloseBlock));
-    std::vector<RankedDocument> ranked =
-        RankBlock(candidates, counts, places, std::max(begin, block) - block, std::min(places.size(), end - block));
+    const size_t block_end = std::min(count, block + kCloseBlock);
+    std::vector<RankedDocument> ranked = RankBlock(DocumentsBetween(candidates, keys, block, block_end),
+                                                   std::max(begin, block) - block, std::min(block_end, end) - block);
     page.insert(page.end(), std::make_move_iterator(ranked.begin()), std::make_move_iterator(ranked.end()));
   }
   if (order.ascending) std::reverse(page.begin(), page.end());

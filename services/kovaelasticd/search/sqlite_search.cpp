@@ -15,12 +15,21 @@
 
 namespace ferrox::engine {
 
-std::vector<RankedDocument> Searcher::OrderByRelevance(const DocSet& documents, const FoundWords& words,
-                                                       SearchReply& reply) {
-  RelevanceRanking ranking(reader_, visible_, words.ranked, request_.ranked_max);
+/// Orders what was found, and loads the hits that are asked for.
+void Searcher::PutPage(const FoundDocuments& found, const FoundWords& words, SearchReply& reply) {
+  RelevanceRanking ranking(reader_, visible_, words.ranked, request_, constants_);
   const auto begin = static_cast<size_t>(request_.offset);
   const PageOrder order = {begin, begin + static_cast<size_t>(request_.limit), request_.ascending};
-  return ranking.Page(documents, reply.total, order, reply.ranking_bounded);
+  const bool by_relevance = request_.sort == SortKey::kRelevance;
+  const std::vector<RankedDocument> page =
+      by_relevance ? ranking.Page(found.documents, reply.total, order, reply.ranking_bounded)
+                   : ColumnOrder(reader_, visible_, request_).Page(found.documents, reply.total);
+  for (const RankedDocument& ranked : page) {
+    WorkLimit::Check();
+    SearchHit& hit = reply.hits.emplace_back(LoadHit(ranked, words));
+    hit.has_all = !found.with_all.has_value() || found.with_all->Contains(ranked.id);
+    if (request_.explain && by_relevance) hit.explanation = ranking.Explain(ranked.id);
+  }
 }
 
 // What a hit takes in memory, roughly: beside its fields, and these by their packed bytes.
@@ -56,17 +65,16 @@ SearchReply Searcher::Run() {
     reply.completions = CompleteWord(reader_, visible_, request_.completed, static_cast<size_t>(request_.limit));
     return reply;
   }
-  QueryEvaluator evaluator(reader_, visible_, request_.ranked_max);
-  const DocSet documents = evaluator.Evaluate(*request_.query);
+  const bool by_relevance = request_.sort == SortKey::kRelevance;
+  QueryEvaluator evaluator(reader_, visible_, by_relevance ? request_.ranked_max : 0, constants_);
+  FoundDocuments found = evaluator.Find(*request_.query, request_.all_words || !by_relevance);
   SearchReply reply;
-  reply.total = documents.Count();
-  const std::vector<RankedDocument> page = request_.sort == SortKey::kRelevance
-                                               ? OrderByRelevance(documents, evaluator.Words(), reply)
-                                               : ColumnOrder(reader_, visible_, request_).Page(documents, reply.total);
-  for (const RankedDocument& ranked : page) {
-    WorkLimit::Check();
-    reply.hits.push_back(LoadHit(ranked, evaluator.Words()));
-  }
+  reply.total = found.documents.Count();
+  if (found.with_all.has_value()) reply.total_all = found.with_all->Count();
+  reply.ignored = std::move(found.ignored);
+  reply.repaired = std::move(found.repaired);
+  reply.none_has_all = found.none_has_all;
+  PutPage(found, evaluator.Words(), reply);
   if (reply.total == 0) {
     const std::vector<std::string>& words = evaluator.Words().looked_for;
     reply.suggestions =
@@ -79,7 +87,8 @@ SearchReply SearchIn(ReaderPool& readers, const SearchRequest& request) {
   std::unique_ptr<StoreReader> reader = readers.Borrow();
   reader->database.Execute("BEGIN");
   reader->Refresh();
-  SearchReply reply = Searcher(*reader, request).Run();
+  static const RankingConstants kConstants;
+  SearchReply reply = Searcher(*reader, request, kConstants).Run();
   reader->database.Execute("COMMIT");
   readers.Return(std::move(reader));
   return reply;

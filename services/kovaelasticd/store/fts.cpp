@@ -4,8 +4,10 @@
 #include <cstring>
 #include <new>
 #include <string_view>
+#include <utility>
 
 #include "services/kovaelasticd/store/document.h"
+#include "services/kovaelasticd/store/fts_positions.h"
 #include "services/kovaelasticd/text/stems.h"
 #include "services/kovaelasticd/text/words.h"
 
@@ -114,7 +116,8 @@ struct PhraseVisit {
 int Hand(int64_t id, const PhraseVisit& visit, uint8_t count, uint8_t places) {
   const bool goes_on =
       visit.collector->Add(id, visit.content ? count : uint8_t{0}, visit.content ? uint8_t{0} : places);
-  return goes_on ? SQLITE_OK : SQLITE_INTERRUPT;
+  if (goes_on) return SQLITE_OK;
+  return visit.collector->HasStopped() ? SQLITE_DONE : SQLITE_INTERRUPT;  // the former ends a walk, and is no failure
 }
 
 /// Adds up one phrase's occurrences in a row.
@@ -167,11 +170,11 @@ void CollectFunction(const Fts5ExtensionApi* api, Fts5Context* row, sqlite3_cont
   if (sqlite3_value_int(arguments[1]) == 0) {
     result = CollectRow(api, row, visit);
   } else {
-    for (int phrase = 0; phrase < api->xPhraseCount(row) && result == SQLITE_OK; ++phrase) {
+    for (int phrase = 0; phrase < api->xPhraseCount(row) && result == SQLITE_OK && !collector->HasStopped(); ++phrase) {
       result = api->xQueryPhrase(row, phrase, &visit, &VisitRow);
     }
   }
-  if (result != SQLITE_OK) sqlite3_result_error_code(context, result);
+  if (result != SQLITE_OK && result != SQLITE_DONE) sqlite3_result_error_code(context, result);
 }
 
 /// FTS5 gives its functions to C code by this call.
@@ -223,7 +226,8 @@ std::vector<WordHit> HitCollector::TakeHits() {
     WorkLimit::Release(held_bytes_ - std::min(held_bytes_, hits_.size() * sizeof(WordHit)));
   }
   held_bytes_ = 0;
-  return std::move(hits_);
+  shorten_at_ = 2 * hits_max_;
+  return std::exchange(hits_, {});
 }
 
 void RegisterFullText(Database& database) {
@@ -231,6 +235,7 @@ void RegisterFullText(Database& database) {
   fts5_tokenizer tokenizer = {&CreateTokenizer, &DeleteTokenizer, &Tokenize};
   database.Check(api->xCreateTokenizer(api, "kova", nullptr, &tokenizer, nullptr));
   database.Check(api->xCreateFunction(api, "kova_collect", nullptr, &CollectFunction, nullptr));
+  RegisterPositions(database, api);
 }
 
 std::string PhraseExpression(const std::vector<std::string>& words, bool prefix) {
@@ -256,8 +261,15 @@ void Collect(Database& database, const char* table, const std::string& expressio
   Statement statement =
       database.Prepare("SELECT kova_collect(" + name + ", ?1, " + (prefix ? "0)" + where : "1)" + where + " LIMIT 1"));
   statement.BindPointer(1, &collector, kCollectorType).Bind(2, std::string_view(expression));
-  while (statement.Step()) {
+  while (!collector.HasStopped() && statement.Step()) {
   }
+}
+
+bool HasExpression(Database& database, const char* table, const std::string& expression, int64_t id) {
+  if (expression.empty()) return false;
+  const std::string name(table);
+  Statement statement = database.Prepare("SELECT 1 FROM " + name + " WHERE " + name + " MATCH ?1 AND rowid = ?2");
+  return statement.Bind(1, std::string_view(expression)).Bind(2, id).Step();
 }
 
 }  // namespace ferrox::engine

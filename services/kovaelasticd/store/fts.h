@@ -1,6 +1,7 @@
 #pragma once
 
 #include <cstdint>
+#include <limits>
 #include <string>
 #include <vector>
 
@@ -25,8 +26,8 @@ struct WordHit {
 };
 constexpr uint8_t kCountMax = 32;
 
-/// Collects the visible documents that a full-text expression finds: all of them in a set, and about `hits_max` of them
-/// one by one, with their counts: those added to the index last; for an asker those with the least PathKeys.
+/// Collects the visible documents that full-text expressions find: all of them in a set, and of each expression's about
+/// `hits_max` one by one, with their counts: those added to the index last; for an asker those with the least PathKeys.
 class HitCollector {
  public:
   /// `visible` must outlive this. `hits_max` may be 0.
@@ -35,12 +36,19 @@ class HitCollector {
   HitCollector(const HitCollector&) = delete;
   HitCollector& operator=(const HitCollector&) = delete;
   ~HitCollector();
-  /// Documents come in ascending order, phrase by phrase. @return whether there is time and memory for more
-  /// (WorkLimit).
+  /// Ends the walk through an expression's documents as soon as more than `documents` visible ones are in the set,
+  /// which does not have all then.
+  void StopAfter(int64_t documents) { documents_max_ = documents; }
+  bool HasStopped() const { return documents_ > documents_max_; }
+  /// Documents come in ascending order, phrase by phrase. @return whether further ones are wanted (StopAfter), and
+  /// there is time and memory for them (WorkLimit).
   bool Add(int64_t id, uint8_t count, uint8_t places) {
     if (++seen_ % kLookEvery == 0 && WorkLimit::IsOver()) return false;
     if (!visible_.Contains(id)) return true;
-    set_.Add(id);
+    if (!set_.Contains(id)) {
+      set_.Add(id);
+      if (++documents_ > documents_max_) return false;
+    }
     if (hits_max_ == 0) return true;
     if (hits_.size() >= shorten_at_) Shorten();
     if (hits_.size() == hits_.capacity() && !Grow()) return false;
@@ -48,10 +56,12 @@ class HitCollector {
     return true;
   }
   const DocSet& Set() const { return set_; }
+  /// How many documents are in the set.
+  int64_t Documents() const { return documents_; }
   /// How often Add was called: the work that it was.
   size_t Seen() const { return seen_; }
   DocSet TakeSet() { return std::move(set_); }
-  /// In ascending order of documents; those of several phrases follow each other.
+  /// Those since the last call, in ascending order of documents; those of several phrases follow each other.
   std::vector<WordHit> TakeHits();
 
  private:
@@ -63,6 +73,8 @@ class HitCollector {
   const size_t hits_max_;
   size_t shorten_at_;
   size_t seen_ = 0;
+  int64_t documents_ = 0;
+  int64_t documents_max_ = std::numeric_limits<int64_t>::max();
   const Visible& visible_;
   DocSet set_;
   std::vector<WordHit> hits_;
@@ -79,5 +91,8 @@ std::string PhraseExpression(const std::vector<std::string>& words, bool prefix)
 /// looks for the beginning of a word.
 void Collect(Database& database, const char* table, const std::string& expression, bool prefix,
              HitCollector& collector);
+
+/// Whether the expression finds the one document; "" finds none.
+bool HasExpression(Database& database, const char* table, const std::string& expression, int64_t id);
 
 }  // namespace ferrox::engine

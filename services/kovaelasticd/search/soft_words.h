@@ -1,0 +1,81 @@
+#pragma once
+
+#include <cstdint>
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "services/kovaelasticd/query/query.h"
+#include "services/kovaelasticd/search/ranked_word.h"
+#include "services/kovaelasticd/search/term_hits.h"
+#include "services/kovaelasticd/store/doc_set.h"
+#include "services/kovaelasticd/store/index_store.h"
+#include "services/kovaelasticd/store/store_reader.h"
+#include "services/kovaelasticd/store/visible.h"
+
+namespace ferrox::engine {
+
+/// The plain words of a query, of which documents need not have all. A word in more than a quarter of the visible
+/// documents is ignored when a rarer one stands beside it: it finds nothing and adds nothing to scores, and is not
+/// walked through to its end, which is what most of the time would go to. Of very many words only the rarest count.
+/// What is in no visible document, or hardly in any, is looked for as what was probably meant, too (RepairWords).
+class SoftWords {
+ public:
+  /// `hits_max` as in HitCollector. All must outlive this.
+  SoftWords(StoreReader& reader, const Visible& visible, size_t hits_max, const RankingConstants& constants)
+      : reader_(reader), visible_(visible), hits_max_(hits_max), constants_(constants) {}
+
+  /// Looks for the words; `rare_beside`: a required one that is rare stands beside them.
+  /// @throws Error kEngineStorage, as all that follow.
+  void Find(const std::vector<const QueryNode*>& nodes, bool rare_beside);
+
+  /// Whether some word is not ignored.
+  bool AnyCounts() const;
+  /// The documents that have one of the words that count.
+  DocSet Any() const;
+  /// Leaves the documents that have all words, the ignored ones too.
+  void KeepAll(DocSet& documents);
+
+  std::vector<std::string> Ignored() const;
+  const std::vector<RepairedWord>& Repaired() const { return repaired_; }
+  /// Hands the words that count over.
+  std::vector<RankedWord> TakeRanked();
+
+ private:
+  struct Word {
+    const QueryNode* node;
+    const QueryNode* group;
+    std::string text;  ///< folded
+    std::vector<WordForm> forms;
+    std::unique_ptr<TermCollector> found;
+    DocSet folders = {};
+    bool is_ignored = false;
+    bool own_first = false;  ///< repairs go beside it
+    std::vector<std::string> repairs = {};
+  };
+
+  /// A word to be looked for; `group`: the first of the words that it may be one number or code with, else null.
+  struct Wanted {
+    const QueryNode* node;
+    const QueryNode* group;
+  };
+  static std::vector<Wanted> Distinct(const std::vector<const QueryNode*>& nodes);
+  Word MakeWord(const Wanted& wanted) const;
+  bool IsCommon(int64_t documents) const { return documents > CommonMax(); }
+  int64_t CommonMax() const { return visible_.Documents() / constants_.common_part; }
+  std::vector<bool> Rarest(const std::vector<Wanted>& wanted);
+  void LookForRepairs();
+  void TakeRepair(Word& word, const std::string& other, double likelihood);
+  void FindElsewhere(Word& word);
+  void KeepIgnored(DocSet& documents, const Word& word);
+  bool Has(int64_t id, const Word& word);
+
+  StoreReader& reader_;
+  const Visible& visible_;
+  const size_t hits_max_;
+  const RankingConstants& constants_;
+  std::vector<Word> words_;
+  std::vector<RepairedWord> repaired_;
+};
+
+}  // namespace ferrox::engine

@@ -1,0 +1,51 @@
+#include "services/kovaelasticd/search/word_value.h"
+
+#include <algorithm>
+#include <string>
+
+namespace ferrox::engine {
+
+double WordValue::Places(uint8_t places, double of_name) const {
+  double value = 0;
+  if ((places & kInName) != 0) value += c_.in_name + of_name * c_.in_whole_name;
+  if ((places & (kInName | kInNamePart)) == kInNamePart) value += c_.in_name_part;
+  if ((places & kInTitle) != 0) value += c_.in_title;
+  if ((places & kInText) != 0) value += c_.in_fields;
+  return value;
+}
+
+/// The term of BM25.
+double WordValue::Text(const TermHit& hit, double length) const {
+  const double count = Occurrences(hit, c_);
+  return count * (c_.k1 + 1) / (count + c_.k1 * length);
+}
+
+double WordValue::Of(const RankedWord& word, const TermHit& hit, const DocumentShape& shape) const {
+  double value = Text(hit, shape.length) + Places(hit.places, shape.of_name);
+  const auto other_places = static_cast<uint8_t>(hit.other_places & ~hit.places);
+  if (other_places != 0) value += OtherShare(hit) * Places(other_places, shape.of_name);
+  if (word.own_first) value = hit.repaired ? std::min(value, c_.repaired_most) : value + c_.own_word;
+  return word.rarity * value;
+}
+
+void WordValue::Explain(const RankedWord& word, const TermHit& hit, const DocumentShape& shape,
+                        std::vector<ScorePart>& parts) const {
+  const std::string& what = hit.repaired && !word.repairs.empty() ? word.repairs.front() : word.word;
+  double left = Of(word, hit, shape);
+  const auto add = [&](const char* where, double value) {
+    value = std::min(value, left);
+    if (value > 0) parts.push_back({what, where, value});
+    left -= value;
+  };
+  const auto place = [&](uint8_t bits) {
+    return word.rarity * (Places(hit.places & bits, shape.of_name) +
+                          OtherShare(hit) * Places(hit.other_places & ~hit.places & bits, shape.of_name));
+  };
+  add("title", place(kInTitle));
+  add("name", place(kInName | kInNamePart));
+  add("fields", place(kInText));
+  add("text", word.rarity * Text(hit, shape.length));
+  add("as typed", left);
+}
+
+}  // namespace ferrox::engine
