@@ -64,7 +64,9 @@ CommandGroup Searching() {
              "wait until all that was changed before can be found (default 30); leaves out what is not sure"},
             {"--partial", nullptr, "exit code 0 or 1 whatever is left out; with --fresh shows what is not sure too"},
             kJson},
-           "Finds files. All words must match; \"a phrase\", prefix*, OR, NOT and ( ) work, and conditions such as "
+           "Finds files, those with more and rarer ones of the words first. +word and \"a phrase\" must be there, "
+           "-word "
+           "must not; prefix*, OR, NOT and ( ) work, and conditions such as "
            "kind:image, size:>10M, author:, artist:, duration:>10m, camera:, taken:2023; the manual lists all. "
            "Exit code 4: a share was left out.",
            &RunSearch,
