@@ -510,6 +510,13 @@ class ToolTest(unittest.TestCase):
             with self.subTest(words=words):
                 self.assertEqual(sorted(expected), self.complete(*words))
 
+    def test_the_engine_completes_words_of_a_search(self):
+        self.assertEqual([], self.complete("search", "re"))
+        daemon = FakeDaemon(self.root, "kovaelasticd", {"complete": success({"completions": [{"text": "report"}, {"text": "rental"}]})})
+        self.assertEqual(["rental", "report"], self.complete("search", "--limit", "3", "x", "re"))
+        daemon.close()
+        self.assertEqual({"text": "re"}, daemon.asked[0][1])
+
     def test_bash_completes(self):
         script = f"""
             . {SOURCE}/packaging/completions/fileindexctl.bash

@@ -13,6 +13,7 @@
 #include "services/kovaelasticd/commands/merged_search.h"
 #include "services/kovaelasticd/commands/user_error.h"
 #include "services/kovaelasticd/commands/user_search.h"
+#include "services/kovaelasticd/search/complete.h"
 #include "services/kovaelasticd/text/words.h"
 
 namespace ferrox::engine {
@@ -97,9 +98,7 @@ Json::Value RunComplete(CommandCall& call) {
       if (error.Code() == Error::kEngineUserBusy) throw;
     }
   }
-  std::sort(found.begin(), found.end(), [](const Completion& a, const Completion& b) {
-    return std::tie(b.in_name, b.documents, a.word) < std::tie(a.in_name, a.documents, b.word);
-  });
+  std::sort(found.begin(), found.end(), &IsBetter);
   if (std::ssize(found) > request.limit) found.resize(static_cast<size_t>(request.limit));
   Json::Value result;
   result["completions"] = Json::Value(Json::arrayValue);

@@ -90,6 +90,12 @@ bool CompleteFromTexts(StoreReader& reader, const Visible& visible, const std::s
 
 }  // namespace
 
+bool IsBetter(const Completion& a, const Completion& b) {
+  const bool a_named = a.in_name && a.documents > 1;
+  const bool b_named = b.in_name && b.documents > 1;
+  return std::tie(b_named, b.documents, a.word) < std::tie(a_named, a.documents, b.word);
+}
+
 std::vector<Completion> CompleteWord(StoreReader& reader, const Visible& visible, const std::string& begin,
                                      size_t limit) {
   std::vector<Completion> found;
@@ -99,9 +105,7 @@ std::vector<Completion> CompleteWord(StoreReader& reader, const Visible& visible
     std::vector<Completion> with_texts = found;
     if (CompleteFromTexts(reader, visible, begin, with_texts)) found = std::move(with_texts);
   }
-  std::sort(found.begin(), found.end(), [](const Completion& a, const Completion& b) {
-    return std::tie(b.in_name, b.documents, a.word) < std::tie(a.in_name, a.documents, b.word);
-  });
+  std::sort(found.begin(), found.end(), &IsBetter);
   if (found.size() > limit) found.resize(limit);
   return found;
 }

@@ -10,8 +10,11 @@
 
 namespace ferrox::engine {
 
-/// Words of visible documents that begin with `begin`, a folded word of two letters or more: at most `limit`, those of
-/// names and titles before others, of each those in the most documents first. Words of texts only where few words begin
+/// The order of completions: words that two names or titles have, or more, before others; then by documents.
+bool IsBetter(const Completion& a, const Completion& b);
+
+/// Words of visible documents that begin with `begin`, a folded word of two letters or more: at most `limit`, the best
+/// first. Words of texts only where few words begin
 /// so, and where two documents have them. Words have four letters or more. Where looking through all of them is too
 /// much work, there are none: how far it came would tell of the words of others. @throws Error kEngineStorage.
 std::vector<Completion> CompleteWord(StoreReader& reader, const Visible& visible, const std::string& begin,
