@@ -2,8 +2,11 @@
 #include "services/kovaelasticd/text/words.h"
 
 #include <string>
+#include <vector>
 
 #include <gtest/gtest.h>
+
+#include "services/kovaelasticd/text/spellings.h"
 
 namespace ferrox::engine {
 namespace {
@@ -89,6 +92,17 @@ TEST(WordsTest, TrigramsCoverTheFoldedText) {
   EXPECT_EQ(Trigrams("ab", 10).size(), 0U);
   EXPECT_EQ(Trigrams("Été.", 10), (std::vector<std::string>{"ete", "te."}));
   EXPECT_EQ(Trigrams("東京都x", 1), (std::vector<std::string>{"東京都"}));
+}
+
+TEST(SpellingsTest, WordsAreFoundAsOthersWriteThem) {
+  using List = std::vector<std::string>;
+  EXPECT_EQ(OtherSpellings("mueller"), (List{"muller"}));
+  EXPECT_EQ(OtherSpellings("muller"), (List{"mueller"}));
+  EXPECT_EQ(OtherSpellings("aarhus").front(), "arhus");
+  for (const char* word : {"", "does", "queue", "neues", "b2345"}) EXPECT_EQ(OtherSpellings(word), List{}) << word;
+  EXPECT_EQ(OtherSpellings("\u0627\u0644\u0643\u062A\u0627\u0628"), (List{"\u0643\u062A\u0627\u0628"}));
+  EXPECT_EQ(OtherSpellings("\u05E1\u05E4\u05E8"), (List{"\u05D4\u05E1\u05E4\u05E8"}));
+  EXPECT_EQ(FoldText("\uFF76\uFF9E\uFF77\uFF98"), FoldText("\u30AC\u30AD\u30EA")) << "narrow kana";
 }
 
 }  // namespace

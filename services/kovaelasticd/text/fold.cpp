@@ -147,11 +147,18 @@ uint32_t Voiced(uint32_t kana, uint32_t mark) {
   return first_rows || rest_of_t || h_row ? kana + 1 : 0;
 }
 
+/// The kana of usual width that the narrow ones U+FF66 .. U+FF9D stand for, as the number of each behind U+3000.
+constexpr unsigned char kWideKana[] = {
+    0xF2, 0xA1, 0xA3, 0xA5, 0xA7, 0xA9, 0xE3, 0xE5, 0xE7, 0xC3, 0xFC, 0xA2, 0xA4, 0xA6, 0xA8, 0xAA, 0xAB, 0xAD, 0xAF,
+    0xB1, 0xB3, 0xB5, 0xB7, 0xB9, 0xBB, 0xBD, 0xBF, 0xC1, 0xC4, 0xC6, 0xC8, 0xCA, 0xCB, 0xCC, 0xCD, 0xCE, 0xCF, 0xD2,
+    0xD5, 0xD8, 0xDB, 0xDE, 0xDF, 0xE0, 0xE1, 0xE2, 0xE4, 0xE6, 0xE8, 0xE9, 0xEA, 0xEB, 0xEC, 0xED, 0xEF, 0xF3};
+
 /// The kana `base` at `pos` together with a sound mark behind it, which is dropped where the kana has no such form.
 CodePoint ComposeKana(std::string_view text, size_t pos, CodePoint base) {
   const size_t next = pos + base.length_bytes;
   if (next >= text.size()) return base;
-  const CodePoint mark = DecodeLenient(text, next);
+  CodePoint mark = DecodeLenient(text, next);
+  if (mark.value == 0xFF9E || mark.value == 0xFF9F) mark.value -= 0xFF9E - 0x3099;  // narrow ones
   if (mark.value != 0x3099 && mark.value != 0x309A) return base;
   const uint32_t voiced = Voiced(base.value, mark.value);
   return {voiced == 0 ? base.value : voiced, base.length_bytes + mark.length_bytes};
@@ -176,7 +183,8 @@ CodePoint ComposeHangul(std::string_view text, size_t pos, CodePoint lead) {
 }  // namespace
 
 CodePoint DecodeAt(std::string_view text, size_t pos) {
-  const CodePoint decoded = DecodeLenient(text, pos);
+  CodePoint decoded = DecodeLenient(text, pos);
+  if (decoded.value >= 0xFF66 && decoded.value <= 0xFF9D) decoded.value = 0x3000U + kWideKana[decoded.value - 0xFF66];
   if (decoded.value >= 0x304B && decoded.value <= 0x30DB) return ComposeKana(text, pos, decoded);
   if (decoded.value >= 0x1100 && decoded.value <= 0x1112) return ComposeHangul(text, pos, decoded);
   return decoded;

@@ -25,7 +25,8 @@ struct CodePoint {
 };
 
 /// Decodes the character at `pos`, which must lie within `text`. A kana and its separate sound mark, or the two or
-/// three parts of a Korean syllable (both are how macOS writes file names), are decoded as the one composed character.
+/// three parts of a Korean syllable (both are how macOS writes file names), are decoded as the one composed character;
+/// narrow kana as those of usual width.
 CodePoint DecodeAt(std::string_view text, size_t pos);
 
 /// Appends the folded form of a letter (no case, no accent; up to two letters, "ss" for a sharp s) or of a paired
