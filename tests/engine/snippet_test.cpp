@@ -33,6 +33,26 @@ TEST(SnippetTest, ThePlaceWithTheMostWordsIsShown) {
   EXPECT_EQ(snippet.rfind("\xE2\x80\xA6"), snippet.size() - 3) << "what is left out is shown";
 }
 
+TEST(SnippetTest, TwoPassagesShowWhatOneHasNot) {
+  const std::string filler(1000, '.');
+  const std::string text = "red fox " + filler + " red red hound and more " + filler + " red hound barn " + filler;
+  const std::string snippet = Snippet(text, {{"fox"}, {"hound"}, {"red"}});
+  EXPECT_EQ(snippet.find("[red] [fox]"), 0U) << snippet;
+  EXPECT_NE(snippet.find("[red] [hound]"), std::string::npos) << snippet;
+  EXPECT_LT(snippet.size(), 330U);
+  EXPECT_NE(Snippet(text, {{"fox", false, 0.1}, {"barn", false, 5}}).find("[barn]"), std::string::npos);
+}
+
+TEST(SnippetTest, StemsAreMarkedAndTheTitleIsSecondChoice) {
+  const std::string text = "Licenses\n" + std::string(500, '.') + " a license in the text, licence";
+  const auto english = [&](const char* word) {
+    return MakeSnippet(text, {{word}}, "[", "]", {Language::kEnglish, "Licenses"});
+  };
+  EXPECT_NE(english("licenses").find("a [license] in"), std::string::npos) << english("licenses");
+  EXPECT_EQ(english("licence").find("[license]"), std::string::npos) << "another word";
+  EXPECT_EQ(Snippet(text, {{"licensing"}}), "") << "of no language that is known";
+}
+
 TEST(SnippetTest, MarksComeInPairsForAnyBytes) {
   uint32_t state = 99;
   for (int round = 0; round < 2000; ++round) {

@@ -54,7 +54,8 @@ SearchHit Searcher::LoadHit(const RankedDocument& ranked, const FoundWords& word
   if (!request_.snippet || words.marked.empty() || stored->text_bytes == 0) return hit;
   Statement body = reader_.database.Prepare("SELECT zstd FROM bodies WHERE id = ?1");
   if (body.Bind(1, ranked.id).Step()) {
-    hit.snippet = MakeSnippet(reader_.codec.Unpack(body.Text(0)), words.marked, request_.mark_start, request_.mark_end);
+    hit.snippet = MakeSnippet(reader_.codec.Unpack(body.Text(0)), words.marked, request_.mark_start, request_.mark_end,
+                              {stored->row.language, hit.title});
   }
   return hit;
 }
