@@ -61,20 +61,19 @@ void PutReadyWords(TokenOutput& output, std::string_view text) {
   }
 }
 
-/// Words, each with what else it is found by at the same place: parts of identifiers, joined codes, its stem where that
-/// is another.
+/// Words, each with what else it is found by at the same place: parts of identifiers, joined codes, and its stem, at
+/// its first places, where that is another.
 void PutProse(TokenOutput& output, Stemmer& stemmer, Language language, std::string_view text) {
   WordScanner scanner(text);
   CodeScanner codes(text);
+  stemmer.BeginText();
   while (scanner.Next() && output.Put(scanner.Word(), scanner.Begin(), scanner.End())) {
     if (scanner.WordKind() != WordScanner::Kind::kWord) continue;
     for (const std::string& word : codes.At(scanner.Begin(), scanner.End())) {
       if (!output.Put(word, scanner.Begin(), scanner.End(), FTS5_TOKEN_COLOCATED)) return;
     }
-    if (language == Language::kNone) continue;
-    const std::string_view stem = stemmer.MarkedStem(language, scanner.Word());
-    if (stem.empty() || stem.substr(1) == scanner.Word()) continue;
-    if (!output.Put(stem, scanner.Begin(), scanner.End(), FTS5_TOKEN_COLOCATED)) return;
+    const std::string_view stem = stemmer.StemInText(language, scanner.Word());
+    if (!stem.empty() && !output.Put(stem, scanner.Begin(), scanner.End(), FTS5_TOKEN_COLOCATED)) return;
   }
 }
 

@@ -59,6 +59,7 @@ constexpr const char* kTables[] = {
     "INSERT INTO content_fts(content_fts, rank) VALUES('hashsize', 8388608)",
     "INSERT INTO meta_fts(meta_fts, rank) VALUES('hashsize', 4194304)",
     "INSERT INTO content_fts(content_fts, rank) VALUES('pgsz', 8100)",
+    "INSERT INTO content_fts(content_fts, rank) VALUES('automerge', 8)",
     "INSERT INTO meta_fts(meta_fts, rank) VALUES('pgsz', 8100)",
 };
 

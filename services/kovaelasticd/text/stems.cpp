@@ -43,6 +43,8 @@ constexpr FoldedEnding kFoldedEndings[] = {
 };
 
 constexpr size_t kShortestStemmed = 3;
+/// How often a text has the stem of the same word. Part of the index format.
+constexpr uint8_t kStemsInText = 4;
 
 /// Whether a word consists of letters that the rules of Latin or Cyrillic languages are made for. Folded, the former
 /// are ASCII, and the latter lie within two lead bytes of UTF-8.
@@ -80,9 +82,13 @@ struct Stemmer::Remembered {
   static constexpr size_t kCount = 4096;
   static constexpr size_t kBytesMax = 22;
 
+  std::string_view Stem() const { return {stem, stem_size}; }
+
   Language language = Language::kNone;
   uint8_t word_size = 0;
   uint8_t stem_size = 0;
+  uint8_t put = 0;    ///< how often StemInText gave the stem for a word
+  uint32_t text = 0;  ///< of this text
   char word[kBytesMax];
   char stem[1 + kBytesMax];  ///< behind kStemMark
 };
@@ -111,24 +117,46 @@ void Stemmer::Cut(Language language, std::string_view word) {
   if (ending != nullptr) stem_ = kStemMark + FoldText(std::string_view(stem_).substr(1));
 }
 
-std::string_view Stemmer::MarkedStem(Language language, std::string_view word) {
-  if (language == Language::kNone || !IsStemmed(word, kStemRules[static_cast<size_t>(language)].cyrillic)) return {};
+/// The word's entry, made for it where another word has it; null, and the stem in stem_, for one too long for it.
+Stemmer::Remembered* Stemmer::Remember(Language language, std::string_view word) {
   if (word.size() > Remembered::kBytesMax) {
     Cut(language, word);
-    return stem_;
+    return nullptr;
   }
   if (remembered_ == nullptr) remembered_ = std::make_unique<Remembered[]>(Remembered::kCount);
   Remembered& at = remembered_[HashOf(word) % Remembered::kCount];
-  if (at.language != language || at.word_size != word.size() || memcmp(at.word, word.data(), word.size()) != 0) {
-    Cut(language, word);
-    if (stem_.size() > sizeof(at.stem)) return stem_;
-    at.language = language;
-    at.word_size = static_cast<uint8_t>(word.size());
-    at.stem_size = static_cast<uint8_t>(stem_.size());
-    std::copy(word.begin(), word.end(), at.word);
-    std::copy(stem_.begin(), stem_.end(), at.stem);
+  if (at.language == language && at.word_size == word.size() && memcmp(at.word, word.data(), word.size()) == 0) {
+    return &at;
   }
-  return {at.stem, at.stem_size};
+  Cut(language, word);
+  if (stem_.size() > sizeof(at.stem)) return nullptr;
+  at.language = language;
+  at.word_size = static_cast<uint8_t>(word.size());
+  at.stem_size = static_cast<uint8_t>(stem_.size());
+  at.put = 0;
+  std::copy(word.begin(), word.end(), at.word);
+  std::copy(stem_.begin(), stem_.end(), at.stem);
+  return &at;
+}
+
+std::string_view Stemmer::MarkedStem(Language language, std::string_view word) {
+  if (language == Language::kNone || !IsStemmed(word, kStemRules[static_cast<size_t>(language)].cyrillic)) return {};
+  const Remembered* const at = Remember(language, word);
+  return at != nullptr ? at->Stem() : std::string_view(stem_);
+}
+
+/// Which words share an entry follows from the text, too: a word that takes the place of another counts from 0.
+std::string_view Stemmer::StemInText(Language language, std::string_view word) {
+  if (language == Language::kNone || !IsStemmed(word, kStemRules[static_cast<size_t>(language)].cyrillic)) return {};
+  Remembered* const at = Remember(language, word);
+  const std::string_view stem = at != nullptr ? at->Stem() : std::string_view(stem_);
+  if (stem.substr(1) == word) return {};
+  if (at == nullptr) return stem;
+  if (at->text != text_) at->put = 0;
+  at->text = text_;
+  if (at->put == kStemsInText) return {};
+  ++at->put;
+  return stem;
 }
 
 std::vector<std::string> QueryStems(std::string_view word) {

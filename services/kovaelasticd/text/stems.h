@@ -53,6 +53,13 @@ class Stemmer {
   /// three letters, with a digit, or of another script than the language's. Valid until the next call.
   std::string_view MarkedStem(Language language, std::string_view word);
 
+  /// Another text begins, whose words StemInText is asked for.
+  void BeginText() { ++text_; }
+  /// MarkedStem for the tables: "" where it is the word itself, and where the text had the same word some times before,
+  /// since a further stem then tells next to nothing. Depends on the text and its language alone, so that the same
+  /// stems are cut when the document goes.
+  std::string_view StemInText(Language language, std::string_view word);
+
  private:
   struct Remembered;
   struct Deleter {
@@ -60,7 +67,9 @@ class Stemmer {
   };
 
   void Cut(Language language, std::string_view word);
+  Remembered* Remember(Language language, std::string_view word);
 
+  uint32_t text_ = 0;                                                      ///< how many have begun
   std::array<std::unique_ptr<sb_stemmer, Deleter>, kLanguages> stemmers_;  ///< made when they are first needed
   std::unique_ptr<Remembered[]> remembered_;                               ///< likewise
   std::string spelled_;                                                    ///< the word as the rules want it
