@@ -51,6 +51,7 @@ constexpr Named kNamed[] = {
     {"k1", &RankingConstants::k1},
     {"b", &RankingConstants::b},
     {"in_name", &RankingConstants::in_name},
+    {"in_most_of_name", &RankingConstants::in_most_of_name},
     {"in_whole_name", &RankingConstants::in_whole_name},
     {"in_title", &RankingConstants::in_title},
     {"in_fields", &RankingConstants::in_fields},
@@ -63,6 +64,7 @@ constexpr Named kNamed[] = {
     {"near_text", &RankingConstants::near_text},
     {"near_title", &RankingConstants::near_title},
     {"near_half", &RankingConstants::near_half},
+    {"long_query", &RankingConstants::long_query},
     {"near_backwards", &RankingConstants::near_backwards},
 };
 

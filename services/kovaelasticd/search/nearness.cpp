@@ -3,7 +3,6 @@
 #include <algorithm>
 #include <array>
 #include <string>
-#include <tuple>
 
 namespace ferrox::engine {
 
@@ -13,6 +12,12 @@ namespace {
 constexpr size_t kTermsMax = 16;
 /// Words further apart add nothing.
 constexpr uint32_t kFarthest = 16;
+
+/// By document, position and word, in one number, which sorts faster. No text has 2^27 words.
+uint64_t PlaceOf(const WordPosition& word) {
+  static_assert(kTermsMax <= 32);
+  return uint64_t{word.document} << 32 | (word.position & 0x07FFFFFF) << 5 | word.term;
+}
 
 }  // namespace
 
@@ -53,9 +58,8 @@ void Nearness::Add(const char* table, const char* column, double worth, const st
     CollectPositions(database_, table, expression,
                      {wanted, constants_.near_positions_max, static_cast<uint8_t>(term), positions});
   }
-  std::sort(positions.begin(), positions.end(), [](const WordPosition& a, const WordPosition& b) {
-    return std::tie(a.document, a.position, a.term) < std::tie(b.document, b.position, b.term);
-  });
+  std::sort(positions.begin(), positions.end(),
+            [](const WordPosition& a, const WordPosition& b) { return PlaceOf(a) < PlaceOf(b); });
   size_t place = 0;
   for (size_t begin = 0; begin < positions.size();) {
     size_t end = begin;

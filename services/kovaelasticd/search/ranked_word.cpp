@@ -6,7 +6,9 @@
 namespace ferrox::engine {
 
 double Rarity(int64_t all, int64_t documents) {
-  return std::log(1.0 + static_cast<double>(all) / static_cast<double>(1 + documents));
+  const auto with = static_cast<double>(documents);
+  const auto without = static_cast<double>(std::max<int64_t>(0, all - documents));
+  return std::log(1 + (without + 0.5) / (with + 0.5));
 }
 
 size_t CountLetters(std::string_view text) {

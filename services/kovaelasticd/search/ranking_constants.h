@@ -10,13 +10,14 @@ namespace ferrox::engine {
 struct RankingConstants {
   // The text, by BM25: occurrences near a limit of 1 + k1 times the rarity, later in longer texts. `b` is how much the
   // length counts, from 0 to 1.
-  double k1 = 1.2;
-  double b = 0.7;
+  double k1 = 1.4;
+  double b = 0.75;
 
   // Places beside the text.
-  double in_name = 1.0;
-  double in_whole_name = 2.0;  ///< more, where the words are all of the name; in part where they are part of it
-  double in_title = 2.0;
+  double in_name = 0.4;
+  double in_most_of_name = 1.0;  ///< more, times the cube of the share of the name that the words are
+  double in_whole_name = 1.5;    ///< more, where they and it are the same
+  double in_title = 3.0;
   double in_fields = 0.8;
   double in_name_part = 0.3;  ///< within a word of the name
   double in_folder = 0.5;     ///< the name of a folder above
@@ -31,17 +32,21 @@ struct RankingConstants {
   double repaired_most = 2.0;
 
   // Words that stand close together, in the measure of the rarer one's rarity.
-  double near_text = 3.0;
-  double near_title = 0.8;
+  double near_text = 4.0;
+  double near_title = 2.0;
   double near_half = 1.0;       ///< so much nearness (1: right behind each other, once) adds half of what it may
-  double near_backwards = 0.5;  ///< the share of words in another order than the query's
+  double near_backwards = 0.6;  ///< the share of words in another order than the query's
+
+  // A query of more words than that is a description: the more words, the less do title and nearness count.
+  double long_query = 4;
 
   // What bounds the work.
-  size_t words_max = 32;      ///< of a query's words the rarest count
-  int64_t common_part = 4;    ///< a word in more than one document in so many does not count beside a rarer one
-  size_t near_words_max = 8;  ///< the rarest are looked at for nearness
-  int64_t near_documents_max = 50000;  ///< a word in more documents is not
-  size_t near_positions_max = 32;      ///< of a word in a document
+  size_t words_max = 32;                ///< of a query's words the rarest count
+  int64_t common_part = 4;              ///< a word in more than one document in so many admits none beside a rarer one,
+  int64_t common_scored_max = 200000;  ///< and does not even score when it is in more than so many
+  size_t near_words_max = 8;            ///< the rarest are looked at for nearness
+  int64_t near_documents_max = 12000;   ///< a word in more documents is not
+  size_t near_positions_max = 32;       ///< of a word in a document
 };
 
 }  // namespace ferrox::engine

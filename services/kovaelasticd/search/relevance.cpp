@@ -31,6 +31,12 @@ void ForEachCandidateHit(std::vector<Candidate>& candidates, const std::vector<T
   }
 }
 
+RankingConstants ForWords(RankingConstants constants, size_t words) {
+  const double share = std::min(1.0, constants.long_query / std::max(1.0, static_cast<double>(words)));
+  for (double* const value : {&constants.in_title, &constants.near_text, &constants.near_title}) *value *= share;
+  return constants;
+}
+
 }  // namespace
 
 RelevanceRanking::RelevanceRanking(StoreReader& reader, const Visible& visible, const std::vector<RankedWord>& words,
@@ -42,8 +48,9 @@ RelevanceRanking::RelevanceRanking(StoreReader& reader, const Visible& visible, 
       average_text_(std::max(
           1.0, static_cast<double>(visible.TextBytes()) / std::max(1.0, static_cast<double>(visible.WithContent())))),
       ranked_max_(request.ranked_max),
-      value_(constants),
-      nearness_(reader.database, words, constants),
+      constants_(ForWords(constants, words.size())),
+      value_(constants_),
+      nearness_(reader.database, words, constants_),
       priors_(reader, *request.query) {}
 
 /// The documents to rank: all; or, with more than ranked_max_ of them, those added last (for an asker those with the
@@ -146,12 +153,13 @@ double RelevanceRanking::CloseScore(int64_t id, std::vector<ScorePart>* parts) {
   double score = ReadRow(id, shape, name_letters, parts);
   std::vector<std::pair<const RankedWord*, const TermHit*>> hits;
   size_t letters = 0;
+  size_t in_name = 0;
   for (const RankedWord& word : words_) {
     const auto before = [](const TermHit& hit, int64_t document) { return hit.id < document; };
     const auto hit = std::lower_bound(word.hits.begin(), word.hits.end(), id, before);
     if (hit != word.hits.end() && hit->id == id) {
       hits.emplace_back(&word, &*hit);
-      if (((hit->places | hit->other_places) & kInName) != 0) letters += word.letters;
+      if (((hit->places | hit->other_places) & kInName) != 0) letters += word.letters, ++in_name;
     }
     if (!word.folders.Contains(id)) continue;
     score += value_.OfFolder(word);
@@ -159,6 +167,7 @@ double RelevanceRanking::CloseScore(int64_t id, std::vector<ScorePart>* parts) {
   }
   shape.of_name =
       name_letters == 0 ? 0 : std::min(1.0, static_cast<double>(letters) / static_cast<double>(name_letters));
+  shape.is_name = shape.of_name >= 1 && in_name == words_.size();
   for (const auto& [word, hit] : hits) {
     score += value_.Of(*word, *hit, shape);
     if (parts != nullptr) value_.Explain(*word, *hit, shape, *parts);

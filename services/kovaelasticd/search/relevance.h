@@ -62,6 +62,7 @@ class RelevanceRanking {
   const std::vector<RankedWord>& words_;
   const double average_text_;
   const size_t ranked_max_;
+  const RankingConstants constants_;  ///< for this query
   const WordValue value_;
   const Nearness nearness_;
   Priors priors_;

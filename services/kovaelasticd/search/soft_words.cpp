@@ -92,14 +92,19 @@ void SoftWords::Find(const std::vector<const QueryNode*>& nodes, bool rare_besid
     Word& word = words_.emplace_back(MakeWord(distinct[i]));
     word.is_ignored = !counts[i];
     if (word.is_ignored) continue;
-    word.found->StopAfter(CommonMax());
+    word.found->StopAfter(WalkedMax());
     word.found->Collect(word.forms);
+    if (!word.found->HasStopped()) FindSpellings(word);
     word.is_ignored = word.found->HasStopped();
+    word.is_common = !word.is_ignored && IsCommon(word.found->Documents());
   }
   LookForRepairs();
-  const auto is_rare = [](const Word& word) { return !word.is_ignored && word.found->Documents() > 0; };
+  const auto is_rare = [](const Word& word) {
+    return !word.is_ignored && !word.is_common && word.found->Documents() > 0;
+  };
   if (!rare_beside && std::none_of(words_.begin(), words_.end(), is_rare)) {
     for (size_t i = 0; i < words_.size(); ++i) {
+      words_[i].is_common = false;
       if (!words_[i].is_ignored || !counts[i]) continue;
       words_[i] = MakeWord(distinct[i]);
       words_[i].found->Collect(words_[i].forms);
@@ -108,6 +113,17 @@ void SoftWords::Find(const std::vector<const QueryNode*>& nodes, bool rare_besid
   for (Word& word : words_) {
     if (!word.is_ignored) FindElsewhere(word);
   }
+}
+
+/// "ue" is likely to stand for an umlaut. That a vowel has lost its dots is a guess, for words that are hardly found.
+void SoftWords::FindSpellings(Word& word) const {
+  const std::string single = SingleWord(*word.node);
+  const bool has_pair =
+      single.find("ae") != single.npos || single.find("oe") != single.npos || single.find("ue") != single.npos;
+  if (!has_pair && word.found->Documents() > kRepairedDocumentsMax) return;
+  const std::vector<WordForm> spellings = SpellingForms(single, constants_);
+  word.found->Collect(spellings);
+  word.forms.insert(word.forms.end(), spellings.begin(), spellings.end());
 }
 
 void SoftWords::LookForRepairs() {
@@ -148,13 +164,14 @@ void SoftWords::FindElsewhere(Word& word) {
 }
 
 bool SoftWords::AnyCounts() const {
-  return std::any_of(words_.begin(), words_.end(), [](const Word& word) { return !word.is_ignored; });
+  return std::any_of(words_.begin(), words_.end(),
+                     [](const Word& word) { return !word.is_ignored && !word.is_common; });
 }
 
 DocSet SoftWords::Any() const {
   DocSet any;
   for (const Word& word : words_) {
-    if (word.is_ignored) continue;
+    if (word.is_ignored || word.is_common) continue;
     any.UniteWith(word.found->Set());
     any.UniteWith(word.folders);
   }
@@ -201,7 +218,7 @@ void SoftWords::KeepAll(DocSet& documents) {
 std::vector<std::string> SoftWords::Ignored() const {
   std::vector<std::string> ignored;
   for (const Word& word : words_) {
-    if (word.is_ignored) ignored.push_back(word.text);
+    if (word.is_ignored || word.is_common) ignored.push_back(word.text);
   }
   return ignored;
 }

@@ -50,6 +50,7 @@ class SoftWords {
     std::unique_ptr<TermCollector> found;
     DocSet folders = {};
     bool is_ignored = false;
+    bool is_common = false;  ///< not ignored, but admits no document
     bool own_first = false;  ///< repairs go beside it
     std::vector<std::string> repairs = {};
   };
@@ -63,7 +64,10 @@ class SoftWords {
   Word MakeWord(const Wanted& wanted) const;
   bool IsCommon(int64_t documents) const { return documents > CommonMax(); }
   int64_t CommonMax() const { return visible_.Documents() / constants_.common_part; }
+  /// In so many documents words are walked through.
+  int64_t WalkedMax() const { return std::max(CommonMax(), constants_.common_scored_max); }
   std::vector<bool> Rarest(const std::vector<Wanted>& wanted);
+  void FindSpellings(Word& word) const;
   void LookForRepairs();
   void TakeRepair(Word& word, const std::string& other, double likelihood);
   void FindElsewhere(Word& word);

@@ -6,6 +6,7 @@
 #include "services/kovaelasticd/store/document.h"
 #include "services/kovaelasticd/store/fts.h"
 #include "services/kovaelasticd/text/codes.h"
+#include "services/kovaelasticd/text/spellings.h"
 #include "services/kovaelasticd/text/stems.h"
 #include "services/kovaelasticd/text/words.h"
 
@@ -54,6 +55,14 @@ void AddStems(std::vector<WordForm>& forms, const std::string& word, double shar
   if (!any.empty()) forms.push_back(TextForm(WordForm::Kind::kStem, "(" + any + ")", false, share));
 }
 
+std::vector<WordForm> OtherForms(const std::vector<std::string>& words, const RankingConstants& constants) {
+  std::vector<WordForm> forms;
+  for (const std::string& word : words) {
+    forms.push_back(TextForm(WordForm::Kind::kOther, PhraseExpression({word}, false), false, constants.spelling));
+  }
+  return forms;
+}
+
 }  // namespace
 
 std::vector<WordForm> FormsOf(const QueryNode& node, bool widely, const RankingConstants& constants) {
@@ -73,11 +82,11 @@ std::vector<WordForm> FormsOf(const QueryNode& node, bool widely, const RankingC
 }
 
 std::vector<WordForm> CodeForms(const std::string& text, const RankingConstants& constants) {
-  std::vector<WordForm> forms;
-  for (const std::string& code : JoinedCodes(text)) {
-    forms.push_back(TextForm(WordForm::Kind::kOther, PhraseExpression({code}, false), false, constants.spelling));
-  }
-  return forms;
+  return OtherForms(JoinedCodes(text), constants);
+}
+
+std::vector<WordForm> SpellingForms(const std::string& word, const RankingConstants& constants) {
+  return OtherForms(OtherSpellings(word), constants);
 }
 
 std::vector<WordForm> FormsOf(const std::string& word, const RankingConstants& constants) {

@@ -24,6 +24,8 @@ std::vector<WordForm> FormsOf(const QueryNode& node, bool widely, const RankingC
 
 /// The single words under which documents may have a number or code that several words of a query are together.
 std::vector<WordForm> CodeForms(const std::string& text, const RankingConstants& constants);
+/// The same for other spellings of a folded word (OtherSpellings).
+std::vector<WordForm> SpellingForms(const std::string& word, const RankingConstants& constants);
 
 /// The forms of a word that is looked for in place of another one.
 std::vector<WordForm> FormsOf(const std::string& word, const RankingConstants& constants);

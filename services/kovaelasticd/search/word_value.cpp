@@ -5,9 +5,10 @@
 
 namespace ferrox::engine {
 
-double WordValue::Places(uint8_t places, double of_name) const {
+double WordValue::Places(uint8_t places, const DocumentShape& shape) const {
   double value = 0;
-  if ((places & kInName) != 0) value += c_.in_name + of_name * c_.in_whole_name;
+  if ((places & kInName) != 0) value += c_.in_name + shape.of_name * shape.of_name * shape.of_name * c_.in_most_of_name;
+  if ((places & kInName) != 0 && shape.is_name) value += c_.in_whole_name;
   if ((places & (kInName | kInNamePart)) == kInNamePart) value += c_.in_name_part;
   if ((places & kInTitle) != 0) value += c_.in_title;
   if ((places & kInText) != 0) value += c_.in_fields;
@@ -21,9 +22,9 @@ double WordValue::Text(const TermHit& hit, double length) const {
 }
 
 double WordValue::Of(const RankedWord& word, const TermHit& hit, const DocumentShape& shape) const {
-  double value = Text(hit, shape.length) + Places(hit.places, shape.of_name);
+  double value = Text(hit, shape.length) + Places(hit.places, shape);
   const auto other_places = static_cast<uint8_t>(hit.other_places & ~hit.places);
-  if (other_places != 0) value += OtherShare(hit) * Places(other_places, shape.of_name);
+  if (other_places != 0) value += OtherShare(hit) * Places(other_places, shape);
   if (word.own_first) value = hit.repaired ? std::min(value, c_.repaired_most) : value + c_.own_word;
   return word.rarity * value;
 }
@@ -38,8 +39,8 @@ void WordValue::Explain(const RankedWord& word, const TermHit& hit, const Docume
     left -= value;
   };
   const auto place = [&](uint8_t bits) {
-    return word.rarity * (Places(hit.places & bits, shape.of_name) +
-                          OtherShare(hit) * Places(hit.other_places & ~hit.places & bits, shape.of_name));
+    return word.rarity *
+           (Places(hit.places & bits, shape) + OtherShare(hit) * Places(hit.other_places & ~hit.places & bits, shape));
   };
   add("title", place(kInTitle));
   add("name", place(kInName | kInNamePart));

@@ -11,8 +11,9 @@ namespace ferrox::engine {
 
 /// What of a document decides how much its words count.
 struct DocumentShape {
-  double length = 1;   ///< of the text, in averages of the index, damped (WordValue::Length)
-  double of_name = 1;  ///< the share of its name that the words of the query are
+  double length = 1;     ///< of the text, in averages of the index, damped (WordValue::Length)
+  double of_name = 1;    ///< the share of its name that the words of the query are
+  bool is_name = false;  ///< the words of the query are its name, and nothing else
 };
 
 /// What one word adds to a document's score, without its nearness to others.
@@ -32,7 +33,7 @@ class WordValue {
   double Length(double averages) const { return 1 - c_.b + c_.b * averages; }
 
  private:
-  double Places(uint8_t places, double of_name) const;
+  double Places(uint8_t places, const DocumentShape& shape) const;
   double Text(const TermHit& hit, double length) const;
 
   const RankingConstants& c_;
