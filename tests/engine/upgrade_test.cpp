@@ -152,7 +152,10 @@ TEST_F(UpgradeTest, AFileOfFormat3WithAccessRecordsAndFromBeforeThemGetsStems) {
     EXPECT_EQ(Find(store, "boats").hits.front().title, "Harbours of the north");
     EXPECT_EQ(FindPaths(store, "title:north"), "/v/en.txt");
     const std::string terms = TermsIn(file_, "content_fts") + TermsIn(file_, "meta_fts");
-    for (const char* stem : {"\x04rechnung ", "\x04" "boat ", "\x04photo "})
+    for (const char* stem : {"\x04rechnung ",
+                             "\x04"
+                             "boat ",
+                             "\x04photo "})
       EXPECT_NE(terms.find(stem), std::string::npos) << stem;
     EXPECT_EQ(store.SetAccess({{"/v/en.txt", "1.1.1.1", "0:0:0644"}}).differing.size(), 1U) << "it has no stamp";
     store.Commit();

@@ -41,12 +41,12 @@ struct RankingConstants {
   double long_query = 4;
 
   // What bounds the work.
-  size_t words_max = 32;                ///< of a query's words the rarest count
-  int64_t common_part = 4;              ///< a word in more than one document in so many admits none beside a rarer one,
+  size_t words_max = 32;               ///< of a query's words the rarest count
+  int64_t common_part = 4;             ///< a word in more than one document in so many admits none beside a rarer one,
   int64_t common_scored_max = 200000;  ///< and does not even score when it is in more than so many
-  size_t near_words_max = 8;            ///< the rarest are looked at for nearness
-  int64_t near_documents_max = 12000;   ///< a word in more documents is not
-  size_t near_positions_max = 32;       ///< of a word in a document
+  size_t near_words_max = 8;           ///< the rarest are looked at for nearness
+  int64_t near_documents_max = 12000;  ///< a word in more documents is not
+  size_t near_positions_max = 32;      ///< of a word in a document
 };
 
 }  // namespace ferrox::engine
