@@ -67,7 +67,7 @@ TEST_F(RepairTest, WordsOfDocumentsAreFoundForTypos) {
 TEST_F(RepairTest, AllWordsAreKnownAfterEachCommit) {
   std::mt19937 random(7);  // NOLINT(cert-msc51-cpp): the same words each time
   std::vector<std::set<std::string>> words_of;
-  for (size_t round = 0; round < 24; ++round) {
+  for (size_t round = 0; round < 12; ++round) {
     std::set<std::string>& fresh = words_of.emplace_back();
     for (int i = 0; i < 1500; ++i) {
       std::string word;

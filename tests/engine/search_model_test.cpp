@@ -150,7 +150,7 @@ class SearchModelTest : public testing::Test {
 
 TEST_F(SearchModelTest, EveryQueryFindsWhatTheModelFinds) {
   size_t found = 0;
-  for (int round = 0; round < 100; ++round) {
+  for (int round = 0; round < 40; ++round) {
     for (size_t i = Random(20); i > 0; --i) Change();
     store_.Commit();
     ASSERT_EQ(store_.Stat().documents, static_cast<int64_t>(model_.size()));
@@ -177,7 +177,7 @@ TEST_F(SearchModelTest, EveryQueryFindsWhatTheModelFinds) {
       found += total > 0 ? 1 : 0;
     }
   }
-  EXPECT_GT(found, 700U) << "the queries must find something for the comparison to mean anything";
+  EXPECT_GT(found, 280U) << "the queries must find something for the comparison to mean anything";
 }
 
 }  // namespace

@@ -139,6 +139,7 @@ MergedReply SearchIndices(std::vector<AskedIndex>& indices, const SearchRequest&
   DropPoorSubstitutes(replies);
   MergedReply merged = AddUp(replies);
   std::vector<std::vector<IndexHit>> of_index;
+  of_index.reserve(replies.size());
   for (IndexReply& of : replies) of_index.push_back(HitsOf(of));
   if (!merges) {
     if (!of_index.empty()) merged.hits = std::move(of_index.front());

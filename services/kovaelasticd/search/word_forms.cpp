@@ -57,6 +57,7 @@ void AddStems(std::vector<WordForm>& forms, const std::string& word, double shar
 
 std::vector<WordForm> OtherForms(const std::vector<std::string>& words, const RankingConstants& constants) {
   std::vector<WordForm> forms;
+  forms.reserve(words.size());
   for (const std::string& word : words) {
     forms.push_back(TextForm(WordForm::Kind::kOther, PhraseExpression({word}, false), false, constants.spelling));
   }
