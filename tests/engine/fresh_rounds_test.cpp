@@ -60,6 +60,7 @@ TEST(FreshRoundsTest, WhoComesDuringARoundSharesTheNextAndHoldsUpNobodyElse) {
   for (auto* later : {&second, &third, &fourth}) EXPECT_EQ(*later->get().outcome, std::set<std::string>{"2"});
   EXPECT_EQ(begun, 2);
   EXPECT_FALSE(await(6, std::chrono::milliseconds(1)).in_time) << "round 3 does not end";
+  wait_for([&] { return begun == 3; });
   may_end.release();
   auto last = begin(7);
   wait_for([&] { return begun == 4; });

@@ -150,7 +150,7 @@ class ManagementWalkTest(InstanceTestCase):
         self.instance.wait_idle("homes", homes)
         self.expect_found("capybara", f"{homes}/carla/notes/diary.txt", f"{homes}/annabel/notes/diary.txt")
         self.ctl("suggest-refresh", "homes")
-        self.assertIn(b"capybara", self.instance.run("search", "--share", "homes", "capybaar").stderr)
+        self.assertIn(b'as "capybara"', self.instance.run("search", "--share", "homes", "capybaar").stdout)
 
     def delete_all(self, papers):
         self.ctl("folder", "delete", "/papers/letters")
