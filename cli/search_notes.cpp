@@ -42,7 +42,7 @@ void PrintHowSearched(const Json::Value& result) {
   PrintRepaired(result, false);
   PrintRepaired(result, true);
   const std::string ignored = WordList(result["ignored"]);
-  if (!ignored.empty()) (void)printf("passed over, since too many files have them: %s\n", ignored.c_str());
+  if (!ignored.empty()) (void)printf("in so many files that they find none by themselves: %s\n", ignored.c_str());
   const std::string some = Count(UintOf(result, "total"));
   if (BoolOf(result, "none_has_all")) {
     (void)printf("no file has all words; these have some\n");

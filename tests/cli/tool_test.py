@@ -363,7 +363,7 @@ class ToolTest(unittest.TestCase):
         self.assertTrue(engine.asked[0][1]["all_words"] and engine.asked[0][1]["explain"])
         self.assertTrue(shown.startswith(
             'searched for "lincense" as "license" or "licence"\nalso searched for "bok" as "book"\n'
-            "passed over, since too many files have them: how, do\n12 with all words, 1,340 with some\n"
+            "in so many files that they find none by themselves: how, do\n12 with all words, 1,340 with some\n"
             "/v/a.txt\n    The Licence\\x1B\n    document, "), shown)
         self.assertIn("\n    score 2.50\n      +2.25  license in title\n      +0.25  recent\n/v/Notes.txt\n    doc", shown)
         self.assertLessEqual(answer.items(), json.loads(self.run_tool("search", "--json", "x").stdout).items())
