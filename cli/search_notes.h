@@ -8,8 +8,8 @@
 /// files and queries and are escaped.
 namespace ferrox::cli {
 
-/// Before the hits: words that were searched for in another spelling or passed over, and how many files have all words.
-/// Nothing where the query was searched for as it is, and all that was found has all words.
+/// Before the hits: words that were searched for in another spelling or find none by themselves, and how many files
+/// have all words. Nothing where the query was searched for as it is, and all that was found has all words.
 void PrintHowSearched(const Json::Value& result);
 
 /// The title of a hit's text; "" when there is none, or when it is the file's name again.

@@ -33,7 +33,7 @@ struct MergedReply {
   std::optional<int64_t> total_all;  ///< nothing where it is `total`
   bool ranking_bounded = false;
   bool none_has_all = false;
-  std::vector<std::string> ignored;      ///< words that are passed over in every index where anything was found
+  std::vector<std::string> ignored;      ///< words that find none by themselves in any index where anything was found
   std::vector<RepairedWord> repaired;    ///< of each index, each once
   std::vector<IndexHit> hits;            ///< the page
   std::vector<std::string> suggestions;  ///< of each index, each once

@@ -37,7 +37,7 @@ struct RankingConstants {
   double near_half = 1.0;       ///< so much nearness (1: right behind each other, once) adds half of what it may
   double near_backwards = 0.6;  ///< the share of words in another order than the query's
 
-  // A query of more words than that is a description: the more words, the less do title and nearness count.
+  // A query of more words than this describes something: the more they are, the less title and nearness count.
   double long_query = 4;
 
   // What bounds the work.

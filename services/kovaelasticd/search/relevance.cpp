@@ -31,6 +31,7 @@ void ForEachCandidateHit(std::vector<Candidate>& candidates, const std::vector<T
   }
 }
 
+/// The constants for a query of so many words.
 RankingConstants ForWords(RankingConstants constants, size_t words) {
   const double share = std::min(1.0, constants.long_query / std::max(1.0, static_cast<double>(words)));
   for (double* const value : {&constants.in_title, &constants.near_text, &constants.near_title}) *value *= share;

@@ -1,5 +1,6 @@
 #pragma once
 
+#include <algorithm>
 #include <cstdint>
 #include <memory>
 #include <string>
@@ -16,8 +17,9 @@
 namespace ferrox::engine {
 
 /// The plain words of a query, of which documents need not have all. A word in more than a quarter of the visible
-/// documents is ignored when a rarer one stands beside it: it finds nothing and adds nothing to scores, and is not
-/// walked through to its end, which is what most of the time would go to. Of very many words only the rarest count.
+/// documents is common: it finds none by itself when a rarer one stands beside it, though it scores. In very many
+/// documents it does not score either, and is not walked through to its end, which is what most of the time would go
+/// to: it is ignored, as are all but the rarest of very many words.
 /// What is in no visible document, or hardly in any, is looked for as what was probably meant, too (RepairWords).
 class SoftWords {
  public:
@@ -29,16 +31,17 @@ class SoftWords {
   /// @throws Error kEngineStorage, as all that follow.
   void Find(const std::vector<const QueryNode*>& nodes, bool rare_beside);
 
-  /// Whether some word is not ignored.
+  /// Whether some word finds documents by itself.
   bool AnyCounts() const;
-  /// The documents that have one of the words that count.
+  /// The documents that have one of those words.
   DocSet Any() const;
   /// Leaves the documents that have all words, the ignored ones too.
   void KeepAll(DocSet& documents);
 
+  /// The words that find none by themselves.
   std::vector<std::string> Ignored() const;
   const std::vector<RepairedWord>& Repaired() const { return repaired_; }
-  /// Hands the words that count over.
+  /// Hands the words that score over.
   std::vector<RankedWord> TakeRanked();
 
  private:

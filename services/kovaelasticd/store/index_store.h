@@ -120,7 +120,7 @@ struct SearchHit {
 struct SearchReply {
   int64_t total = 0;                     ///< all documents found, whether shown or not
   std::optional<int64_t> total_all;      ///< of these, those with all words; nothing where all have them anyway
-  std::vector<std::string> ignored;      ///< words in so many documents that they were passed over
+  std::vector<std::string> ignored;      ///< words in so many documents that they find none by themselves
   std::vector<RepairedWord> repaired;    ///< in the order of the query
   bool none_has_all = false;             ///< all_words was asked for, no document has all, and some words sufficed
   bool ranking_bounded = false;          ///< there were more than ranked_max to order; some were left out of that
