@@ -8,6 +8,7 @@
 
 #include <gtest/gtest.h>
 
+#include "services/kovaelasticd/search/complete.h"
 #include "services/kovaelasticd/store/sqlite_store.h"
 #include "tests/engine/store_helpers.h"
 #include "tests/support/temp_dir.h"
@@ -61,6 +62,25 @@ TEST_F(RepairTest, WordsOfDocumentsAreFoundForTypos) {
   for (const auto& [typed, meant] : cases) EXPECT_EQ(meant, Repaired(typed)) << typed;
   EXPECT_EQ("license", Repaired("lisense", 1));
   EXPECT_EQ("", Repaired("printer", 1));  // two documents are not many more than one
+}
+
+TEST_F(RepairTest, BeginningsBecomeWordsOfNamesThenOfTexts) {
+  for (int i = 0; i < 3; ++i) Put("/v/report " + std::to_string(i), "Notes\n\nreporter reporter repository");
+  Put("/v/reply", "Notes\n\nreport reptile");
+  Put("/v/other", "Notes\n\nreporter rep");
+  store_.Commit();
+  const auto complete = [&](const std::string& begin) {
+    std::string words;
+    InSnapshot([&](StoreReader& reader, const Visible& visible) {
+      for (const Completion& completion : CompleteWord(reader, visible, begin, 3))
+        words += completion.word + ":" + std::to_string(completion.documents) + " ";
+    });
+    return words;
+  };
+  EXPECT_EQ("report:3 reporter:4 repository:3 ", complete("rep"));
+  EXPECT_EQ("report:3 reply:1 ", complete("re"));
+  EXPECT_EQ("reporter:4 ", complete("report"));
+  EXPECT_EQ("", complete("r"));
 }
 
 /// As segments are merged, numbered anew and shortened, no word must be overlooked.

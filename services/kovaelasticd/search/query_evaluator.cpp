@@ -5,6 +5,7 @@
 #include <utility>
 
 #include "fileindex/util.h"
+#include "services/kovaelasticd/search/folder_words.h"
 #include "services/kovaelasticd/search/path_condition.h"
 #include "services/kovaelasticd/store/document.h"
 #include "services/kovaelasticd/store/store_rows.h"
@@ -227,14 +228,15 @@ bool QueryEvaluator::MatchesFilter(int64_t id, const QueryNode& filter) {
 
 /// The documents with a word, phrase or beginning of a word; with `ranking` also its hits, and what snippets mark.
 /// kText looks into the content, the name, the title and the searchable fields; kField into the named fields; kName
-/// into names. A plain word is also looked for within names, by its groups of three characters; and in other forms,
-/// unless it is behind a NOT.
+/// into names. A plain word is also looked for within names, by its groups of three characters; and in other forms and
+/// in the names of folders above, unless it is behind a NOT.
 DocSet QueryEvaluator::EvaluateWords(const QueryNode& node, bool ranking) {
   TermCollector found(database_, visible_, ranking ? hits_max_ : 0);
   const std::vector<WordForm> forms = FormsOf(node, ranking, constants_);
   found.Collect(forms);
   const bool in_names = node.type == QueryNode::Type::kName;
   if (in_names || (node.type == QueryNode::Type::kText && !node.phrase)) found.CollectNameParts(node.text);
+  DocSet all = found.Set();
   if (ranking) {
     RankedWord& word = found_words_.ranked.emplace_back(RankedWord{FoldText(node.text)});
     word.letters = CountLetters(word.word);
@@ -242,9 +244,14 @@ DocSet QueryEvaluator::EvaluateWords(const QueryNode& node, bool ranking) {
     word.rarity = Rarity(visible_.Documents(), word.documents);
     word.hits = found.TakeHits();
     word.phrases = PhrasesOf(forms);
+    if (node.type == QueryNode::Type::kText && !node.phrase) {
+      word.folders = DocumentsInFoldersNamed(reader_, visible_, SplitQueryText(node.text, node.prefix));
+      word.folder_rarity = std::min(word.rarity, Rarity(visible_.Documents(), word.folders.Count()));
+      all.UniteWith(word.folders);
+    }
     NoteWords(node);
   }
-  return found.Set();
+  return all;
 }
 
 void QueryEvaluator::NoteWords(const QueryNode& node) {
