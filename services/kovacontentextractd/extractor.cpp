@@ -11,11 +11,11 @@
 
 #include <kova/content_type.h>
 
+#include "base/open_beneath.h"
 #include "common/error.h"
 #include "common/file_util.h"
 #include "common/json_util.h"
 #include "common/log.h"
-#include "services/kovacontentextractd/open_beneath.h"
 #include "services/kovacontentextractd/readers/reader.h"
 #include "services/kovacontentextractd/readers/utf8.h"
 #include "services/support/json_command.h"
@@ -151,7 +151,7 @@ Extractor::OpenedFile Extractor::OpenFile(const std::string& root, const std::st
   const services::OpenLimit::Turn turn(open_limit_, root);
   OpenedFile file;
   struct stat info = {};
-  file.fd = OpenBeneath(root, path);
+  file.fd = base::OpenBeneath(root, path);
   if (!file.fd.Valid() || fstat(file.fd.Get(), &info) != 0) {
     file.problem = errno;
     return file;

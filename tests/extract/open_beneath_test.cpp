@@ -1,5 +1,5 @@
 // Catches files outside of a share that are reached through a link or a path, also while folders are swapped.
-#include "services/kovacontentextractd/open_beneath.h"
+#include "base/open_beneath.h"
 
 #include <fcntl.h>
 #include <sys/stat.h>
@@ -18,7 +18,7 @@
 namespace ferrox::test {
 namespace {
 
-using extract::OpenBeneath;
+using base::OpenBeneath;
 
 class OpenBeneathTest : public testing::TestWithParam<bool> {
  protected:

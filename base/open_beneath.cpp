@@ -1,4 +1,4 @@
-#include "services/kovacontentextractd/open_beneath.h"
+#include "base/open_beneath.h"
 
 #include <fcntl.h>
 #include <linux/openat2.h>
@@ -10,7 +10,7 @@
 
 #include "base/path.h"
 
-namespace ferrox::extract {
+namespace base {
 
 namespace {
 
@@ -26,8 +26,8 @@ int AskKernel(int root, const char* below, int flags) {
 }
 
 /// Opens a folder without following a link. The kernel reports a link in its place as ENOTDIR; here it is ELOOP.
-base::UniqueFd StepInto(int folder, const char* name) {
-  base::UniqueFd next(openat(folder, name, kFolderFlags));
+UniqueFd StepInto(int folder, const char* name) {
+  UniqueFd next(openat(folder, name, kFolderFlags));
   struct stat info = {};
   if (!next.Valid() && errno == ENOTDIR) {
     const bool is_link = fstatat(folder, name, &info, AT_SYMLINK_NOFOLLOW) == 0 && S_ISLNK(info.st_mode);
@@ -39,7 +39,7 @@ base::UniqueFd StepInto(int folder, const char* name) {
 /// The same step by step: each folder is opened without following a link, relative to the one before, so a swap in
 /// between cannot lead elsewhere.
 int Walk(int root, const std::string& below, int flags) {
-  base::UniqueFd folder(openat(root, ".", kFolderFlags));
+  UniqueFd folder(openat(root, ".", kFolderFlags));
   size_t begin = 0;
   for (size_t slash; folder.Valid() && (slash = below.find('/', begin)) != std::string::npos; begin = slash + 1) {
     const std::string name = below.substr(begin, slash - begin);
@@ -62,16 +62,16 @@ int Open(int root, const std::string& below, int flags, bool may_ask_kernel) {
 
 }  // namespace
 
-base::UniqueFd OpenBeneath(const std::string& root, const std::string& path, bool may_ask_kernel) {
+UniqueFd OpenBeneath(const std::string& root, const std::string& path, bool may_ask_kernel) {
   const size_t begin = root == "/" ? 1 : root.size() + 1;
-  const bool is_below = base::IsBelow(path, root) && path.size() > begin && path.find('\0') == std::string::npos;
-  if (!is_below) return errno = EINVAL, base::UniqueFd();
-  const base::UniqueFd folder(open(root.empty() ? "/" : root.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
-  if (!folder.Valid()) return base::UniqueFd();
+  const bool is_below = IsBelow(path, root) && path.size() > begin && path.find('\0') == std::string::npos;
+  if (!is_below) return errno = EINVAL, UniqueFd();
+  const UniqueFd folder(open(root.empty() ? "/" : root.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
+  if (!folder.Valid()) return UniqueFd();
   const std::string below = path.substr(begin);
   int fd = Open(folder.Get(), below, kFileFlags | O_NOATIME, may_ask_kernel);
   if (fd < 0 && errno == EPERM) fd = Open(folder.Get(), below, kFileFlags, may_ask_kernel);
-  return base::UniqueFd(fd);
+  return UniqueFd(fd);
 }
 
-}  // namespace ferrox::extract
+}  // namespace base
