@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <cerrno>
 #include <climits>
+#include <utility>
 
 #include <kova/fs.h>
 #include <kova/recycle.h>
@@ -39,6 +40,28 @@ bool IsInSnapshot(const std::string& full_path) {
 bool IsOnIndexableFS(const std::string& full_path) {
   const int type = KOVAGetFSType(full_path.c_str(), 0);
   return type >= 0 && KOVAFSIsRemoteFS(type) == 0 && KOVAFSIsImageFS(type) == 0 && type != kNeverIndexedFS;
+}
+
+std::string ShareNameByFullPath(const std::string& full_path) {
+  std::string share_name;
+  std::string share_path;
+  GetShareNamePathByFullPath(share_name, share_path, full_path);
+  return share_name;
+}
+
+/// The share that a path lies in. The platform takes two questions for that: when the share has gone between them, the
+/// path lies in the one around it. @throws Error as GetShareNamePathByFullPath; kNoSuchShare.
+sdk::SDKShare ShareByFullPath(const std::string& full_path) {
+  std::string asked;
+  std::string name = ShareNameByFullPath(full_path);
+  while (true) {
+    try {
+      return sdk::SDKShare(name);
+    } catch (const Error&) {
+      asked = std::exchange(name, ShareNameByFullPath(full_path));
+      if (name == asked) throw;
+    }
+  }
 }
 
 /// Whether something other than the share's own file system is mounted at the path.
@@ -93,9 +116,7 @@ std::string ReplacePathShare(const std::string& path, const std::string& new_sha
 }
 
 bool IsFullPathInRecycleBin(const std::string& full_path) {
-  std::string share_name;
-  std::string share_path;
-  GetShareNamePathByFullPath(share_name, share_path, full_path);
+  const std::string share_name = ShareNameByFullPath(full_path);
   const LockMutex guard(sdk::SDKMutex());
   if (Contains(full_path, "#recycle") && KOVAShareIsShareRecycle(full_path.c_str()) == 1) return true;
   return share_name == "homes" && KOVARecycleUserHomePathIsExist(full_path.c_str(), kEveryKindOfUser) == 1;
@@ -103,10 +124,7 @@ bool IsFullPathInRecycleBin(const std::string& full_path) {
 
 bool CanFullPathBeIndexed(const std::string& full_path) {
   if (IsInSnapshot(full_path) || !IsOnIndexableFS(full_path)) return false;
-  std::string share_name;
-  std::string share_path;
-  GetShareNamePathByFullPath(share_name, share_path, full_path);
-  const sdk::SDKShare share(share_name);
+  const sdk::SDKShare share = ShareByFullPath(full_path);
   if (!share.CanBeIndexed() || IsFullPathInRecycleBin(full_path) || IsForeignMountPoint(full_path, share)) return false;
   return !full_path.empty() && RealPath(full_path) == full_path;
 }

@@ -1,8 +1,12 @@
 #include "services/fileindexd/indexed_shares.h"
 
 #include <set>
+#include <utility>
+
+#include <kova/error.h>
 
 #include "base/path.h"
+#include "common/error.h"
 #include "fileindex/folders/folder_mgr.h"
 #include "sdk/share.h"
 
@@ -21,8 +25,22 @@ IndexedShares LoadIndexedShares() {
     IndexedShare& indexed = shares[share];
     indexed.all_paused = indexed.all_paused && folder->IsPaused();
   }
-  for (auto& [share, indexed] : shares) indexed.root = sdk::SDKShare(share).GetPath();
+  for (auto at = shares.begin(); at != shares.end();) {
+    std::optional<std::string> root = RootOf(at->first);
+    if (!root.has_value()) {
+      at = shares.erase(at);
+    } else {
+      (at++)->second.root = std::move(*root);
+    }
+  }
   return shares;
+}
+
+std::optional<std::string> RootOf(const std::string& share) try {
+  return sdk::SDKShare(share).GetPath();
+} catch (const Error&) {
+  if (KLIBCErrGet() != KOVA_ERR_NO_SUCH_SHARE) throw;
+  return std::nullopt;
 }
 
 std::vector<std::string> InnerRoots(const IndexedShares& shares, const std::string& root) {

@@ -22,16 +22,13 @@ bool InSnapshot(const std::string& path) {
 }
 
 /// Of a folder that is gone, only its place can be judged: it may be an old or a passing name of one that is indexed,
-/// and the operations that follow still need its documents.
+/// and the operations that follow still need its documents. @throws Error when the platform does not say which share
+/// the folder lies in: that does not mean that it is left out, which would cost its documents.
 bool AskAllRules(const std::string& folder) {
   struct stat status = {};
   const bool gone = lstat(folder.c_str(), &status) != 0 && (errno == ENOENT || errno == ENOTDIR);
-  try {
-    if (gone) return !fileindex::IsFullPathInRecycleBin(folder);
-    return fileindex::CanFullPathBeIndexed(folder) && !InSnapshot(folder);
-  } catch (const Error&) {
-    return false;  // the path lies in no share any more
-  }
+  if (gone) return !fileindex::IsFullPathInRecycleBin(folder);
+  return fileindex::CanFullPathBeIndexed(folder) && !InSnapshot(folder);
 }
 
 }  // namespace

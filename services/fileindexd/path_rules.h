@@ -15,7 +15,8 @@ std::string ShareProblem(const std::string& share, const std::string& root);
 
 /// Decides which paths of one share are indexed: those under its indexed folders, unless the rules for names and places
 /// leave them out. Asks the costly questions (file system, share, recycle bin, mount point, canonical path) once per
-/// folder or device instead of once per file. Made per pass; belongs to one thread.
+/// folder or device instead of once per file. Made per pass; belongs to one thread. A call throws Error kInternal or
+/// kNoSuchShare while the platform does not know the path's share; the pass is then to be tried again.
 class PathRules {
  public:
   using Place = ShareFolders::Place;

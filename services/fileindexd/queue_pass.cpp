@@ -37,6 +37,8 @@ bool QueuePass::Run() {
   if (!Detach()) return false;
   // Loaded only now: of folders that change later, the events are in a later queue.
   const ShareFolders folders = context_.folders.Load();
+  // The files of an inner share that is being renamed would be read for this one, too.
+  if (folders.MissInnerOf(context_.applied.Get())) AwaitOtherFolders(folders);
   const std::set<uint64_t> changed_files = ChangedNumbersIn(context_.queue.DetachedPath());
   OperationRunner runner({context_, folders, keeper_.Index(), held_, changed_files, keeper_.MayHoldStrays(),
                           [&] { AwaitOtherFolders(folders); }, early_writes_});

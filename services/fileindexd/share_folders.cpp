@@ -1,7 +1,7 @@
 #include "services/fileindexd/share_folders.h"
 
 #include <algorithm>
-#include <set>
+#include <optional>
 
 #include <json/value.h>
 
@@ -11,6 +11,7 @@
 #include "common/json_util.h"
 #include "fileindex/folders/folder_mgr.h"
 #include "sdk/share.h"
+#include "services/fileindexd/indexed_shares.h"
 
 namespace ferrox::indexd {
 
@@ -19,19 +20,6 @@ namespace {
 using fileindex::kContentKindNames;
 
 constexpr char kInner[] = "inner";
-
-/// The indexed shares below a folder: their names, by their own folders.
-std::map<std::string, std::string, std::less<>> SharesBelow(const std::string& root,
-                                                            const fileindex::FolderMgr& folder_mgr) {
-  std::map<std::string, std::string, std::less<>> below;
-  const std::set<std::string> indexed = folder_mgr.GetIndexedShares();
-  for (const std::string& name : sdk::SDKShare::Enum()) {
-    if (indexed.count(name) == 0) continue;
-    const std::string path = sdk::SDKShare(name).GetPath();
-    if (base::IsBelow(path, root)) below[path] = name;
-  }
-  return below;
-}
 
 }  // namespace
 
@@ -72,8 +60,18 @@ ShareFolders ShareFolders::Load(const std::string& share, const std::string& roo
     loaded.any_paused_ = loaded.any_paused_ || folder->IsPaused();
     loaded.Add(root + path.substr(1 + share.size()), fileindex::KindsOf(*folder));
   }
-  for (const auto& [path, name] : SharesBelow(root, folder_mgr)) loaded.AddInner(path, name);
+  loaded.LoadInner(root, folder_mgr);
   return loaded;
+}
+
+void ShareFolders::LoadInner(const std::string& root, const fileindex::FolderMgr& folder_mgr) {
+  missing_ = folder_mgr.GetIndexedShares();
+  for (const std::string& name : sdk::SDKShare::Enum()) {
+    const std::optional<std::string> path = missing_.count(name) != 0 ? RootOf(name) : std::nullopt;
+    if (!path.has_value()) continue;
+    missing_.erase(name);
+    if (base::IsBelow(*path, root)) AddInner(*path, name);
+  }
 }
 
 /// Of a path that stands twice, the first counts.
@@ -91,6 +89,11 @@ void ShareFolders::AddInner(const std::string& full_path, const std::string& sha
 bool ShareFolders::SameInner(const ShareFolders& other) const {
   return std::equal(inner_.begin(), inner_.end(), other.inner_.begin(), other.inner_.end(),
                     [](const auto& ours, const auto& theirs) { return ours.first == theirs.first; });
+}
+
+bool ShareFolders::MissInnerOf(const ShareFolders& before) const {
+  return std::any_of(before.inner_.begin(), before.inner_.end(),
+                     [this](const auto& inner) { return missing_.count(inner.second) != 0; });
 }
 
 bool ShareFolders::IsInInner(std::string_view full_path) const {

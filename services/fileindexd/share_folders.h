@@ -2,6 +2,7 @@
 
 #include <cstddef>
 #include <map>
+#include <set>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -10,6 +11,10 @@
 
 #include "base/path_table.h"
 #include "fileindex/folders/folder_rule.h"
+
+namespace ferrox::fileindex {
+class FolderMgr;
+}
 
 namespace ferrox::indexd {
 
@@ -48,6 +53,9 @@ class ShareFolders {
   Place PlaceOf(std::string_view full_path) const;
   /// The indexed shares that lie in this one: their names, by their folders.
   const std::map<std::string, std::string, std::less<>>& Inner() const { return inner_; }
+  /// Whether one that lay in this one `before` is named by folders still, but by the share table no longer: it is being
+  /// renamed, and the table has its new name before the folders do.
+  bool MissInnerOf(const ShareFolders& before) const;
   /// Whether the path is, or lies in, the folder of one of them.
   bool IsInInner(std::string_view full_path) const;
   /// Whether the content of a file there is read: its kind is on, or it is of none of the four kinds.
@@ -63,6 +71,7 @@ class ShareFolders {
   using Kinds = fileindex::ContentKinds;
 
   void Add(const std::string& full_path, const Kinds& kinds);
+  void LoadInner(const std::string& root, const fileindex::FolderMgr& folder_mgr);
   void AddInner(const std::string& full_path, const std::string& share);
   bool SameInner(const ShareFolders& other) const;
   /// The kinds under which the path lies; null when it is under no folder.
@@ -72,6 +81,7 @@ class ShareFolders {
   bool recycle_bin_ = false;
   std::map<std::string, Kinds, std::less<>> kinds_;        ///< by full path
   std::map<std::string, std::string, std::less<>> inner_;  ///< names of shares by full path
+  std::set<std::string> missing_;  ///< the names of shares that have folders and are not in the share table
   // The same two, to be found from the paths below.
   base::PathTable<Kinds> by_full_path_;
   base::PathTable<bool> inner_by_full_path_;

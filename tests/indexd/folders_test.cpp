@@ -1,7 +1,11 @@
 // Catches documents that a change of the indexed folders leaves, loses, or reads again needlessly.
 #include <algorithm>
+#include <thread>
 
+#include "base/path.h"
+#include "fileindex/queue/queue_file.h"
 #include "fileindex/status_mgr.h"
+#include "services/fileindexd/path_rules.h"
 #include "tests/indexd/worker_test.h"
 
 namespace ferrox::indexd {
@@ -136,6 +140,45 @@ TEST_F(FoldersTest, SingleEventsKeepToTheFolders) {
     EXPECT_EQ(Expected(), Indexed());
     MakeTree();
   }
+}
+
+/// Else their documents would go.
+TEST_F(FoldersTest, FoldersOfAShareThatIsNotToBeFoundAreNotLeftOut) {
+  MakeTree();
+  const ShareFolders folders = ShareFolders::Load(share, root);
+  kova::host::RemoveShare(share);
+  PathRules rules(share, root, folders);
+  for (const char* name : {"d", "d/f.txt", "gone/f.txt"}) EXPECT_THROW(rules.PlaceOf(At(name)), Error) << name;
+  kova::host::AddShare({share, root});
+}
+
+/// The share table names it anew before the folders do.
+TEST_F(FoldersTest, InnerShareThatIsRenamedIsNotReadMeanwhile) {
+  MakeTree();
+  kova::host::AddShare({"d", At("d")});
+  Configure("d", {{"", "davp"}});
+  patience = std::chrono::minutes(5);
+  worker = MakeWorker();
+  Process(Line(kReindex, root));
+  fs::rename(At("d"), At("n"));
+  kova::host::RenameShare("d", "n", At("n"));
+  std::thread folders_follow([this] {
+    while (!fs::exists(fileindex::DetachedQueuePath(queue_path))) usleep(1000);
+    usleep(50000);  // in which a pass that does not wait reads
+    const fileindex::FolderMgr folder_mgr;
+    for (const auto& folder : folder_mgr.GetFolders()) folder->SetShare(folder->GetShare() == "d" ? "n" : share);
+    folder_mgr.Save();
+  });
+  try {
+    worker->RunOnce();
+  } catch (const Interrupted&) {
+    // It begins anew with these folders.
+  }
+  folders_follow.join();
+  worker->RunOnce();
+  for (const auto& [path, times] : index->upserts) EXPECT_FALSE(base::IsAtOrBelow(path, At("n"))) << path;
+  Configure("n", {});
+  kova::host::RemoveShare("n");
 }
 
 /// The library takes a reindex that is being carried out for one that covers the new configuration.

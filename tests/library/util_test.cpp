@@ -135,6 +135,14 @@ TEST_F(UtilTest, WhatCanBeIndexed) {
   }
 }
 
+TEST_F(UtilTest, ShareRemovedWhileItIsAskedForLeavesItsFolderToTheOneAround) {
+  platform_.shares["inner"] = {share_ + "/folder"};
+  platform_.on_call = [&](const std::string& call) {
+    if (call == "KOVAShareGet(inner)") platform_.shares.erase("inner");
+  };
+  EXPECT_TRUE(CanFullPathBeIndexed(share_ + "/folder"));
+}
+
 TEST_F(UtilTest, RecycleBins) {
   platform_.recycle_bins = {share_};
   EXPECT_TRUE(IsFullPathInRecycleBin(share_ + "/#recycle/a"));
