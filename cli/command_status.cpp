@@ -3,6 +3,7 @@
 
 #include "cli/ask.h"
 #include "cli/command_table.h"
+#include "cli/configuration_change.h"
 #include "cli/escape.h"
 #include "cli/explain.h"
 #include "cli/format.h"
@@ -219,11 +220,39 @@ void PrintShares(const Report& report) {
   }
 }
 
+/// Takes all other shares out of a list.
+void KeepShare(Json::Value& list, const std::string& share) {
+  Json::Value kept(Json::arrayValue);
+  for (const Json::Value& entry : list) {
+    if (TextOf(entry, "share") == share) kept.append(entry);
+  }
+  list.swap(kept);
+}
+
+/// The share as the index daemon has it, or as one that nothing works on. The daemons are shown where one is missing.
+int ShowOneShare(Report report, const std::string& name, bool json) {
+  const bool is_readable = report.folders_problem.empty() && report.table_problem.empty();
+  const std::string share = is_readable ? IndexedShare(name) : name;
+  const int code = ExitCodeOf(report);
+  Json::Value& daemon = report.state.index_daemon.status;
+  if (daemon.isObject()) KeepShare(daemon["shares"], share);
+  KeepShare(report.resting, share);
+  if (json) {
+    const Json::Value entry = ShareIn(daemon, share);
+    PrintJson(entry.isNull() ? report.resting[0] : entry);
+    return code;
+  }
+  if (code != kDone) PrintDaemons(report);
+  PrintShares(report);
+  return code;
+}
+
 }  // namespace
 
 /// The exit code says whether all that is needed runs, for scripts that do not read the rest.
 int RunStatus(const Arguments& arguments) {
   const Report report = Gather();
+  if (!arguments.words.empty()) return ShowOneShare(report, arguments.words[0], arguments.Has("--json"));
   if (arguments.Has("--json")) {
     PrintAsJson(report);
     return ExitCodeOf(report);

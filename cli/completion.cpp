@@ -5,6 +5,7 @@
 #include <algorithm>
 #include <chrono>
 #include <cstdio>
+#include <utility>
 
 #include "base/files.h"
 #include "base/path.h"
@@ -14,6 +15,7 @@
 #include "cli/format.h"
 #include "cli/global_options.h"
 #include "cli/kinds.h"
+#include "cli/word_meaning.h"
 #include "common/file_util.h"
 #include "fileindex/folders/folder_mgr.h"
 #include "sdk/share.h"
@@ -83,8 +85,7 @@ Words QueryWords(const std::string& typed) {
 /// What can stand for a name of the usage line.
 Words Candidates(std::string name, const std::string& typed) {
   if (name.find('|') != std::string::npos) return Split(name, '|');
-  while (!name.empty() && (name.back() == ']' || name.back() == '.')) name.pop_back();
-  if (!name.empty() && name[0] == '[') name.erase(0, 1);
+  name = PlainWord(std::move(name));
   if (name == "QUERY") return QueryWords(typed);
   // Which shares and folders there are is read from files that are closed to ordinary users.
   if (!IsPrivileged() && (name == "SHARE" || name == "PATH")) return {};
@@ -163,8 +164,12 @@ Words AllCompletions(Words& words) {
   if (words.empty()) return {};
   if (words.size() == 1) {
     Words found = CommandWords("");
-    found.insert(found.end(), {"--root", "--help", "--version"});
+    found.insert(found.end(), {"help", "--root", "--help", "--version"});
     return found;
+  }
+  if (words[0] == "help") {
+    words.erase(words.begin());
+    return words.size() == 1 ? CommandWords("") : words.size() == 2 ? CommandWords(words[0]) : Words();
   }
   size_t count = 0;
   const Words typed_before(words.begin(), words.end() - 1);

@@ -28,25 +28,6 @@ constexpr const char* kShownElsewhere[] = {kKOVAMDPath,        kKOVAMDParent,   
                                            k_KOVAExtractError, k_KOVAExtractVersion,  k_KOVANeedMeta,
                                            k_KOVAStamp,        k_KOVATextEncoding,    k_KOVATextCut};
 
-/// "KOVAMDTitle" is "Title", "KOVAStateOrProvince" "StateOrProvince".
-std::string FriendlyName(const std::string& field) {
-  for (const char* prefix : {"_KOVAMD", "_KOVA", "KOVAMD", "KOVA"}) {
-    if (StringStartWith(field, prefix)) return field.substr(std::string(prefix).size());
-  }
-  return field;
-}
-
-/// Fields that end in "Date" hold seconds; an array is shown as one line.
-std::string FriendlyValue(const std::string& field, const Json::Value& value) {
-  const bool is_date = field.size() > 4 && field.compare(field.size() - 4, 4, "Date") == 0;
-  if (is_date && value.isInt64()) return Date(value.asInt64());
-  if (value.isString()) return EscapeOneLine(value.asString());
-  if (value.isNumeric() || value.isBool()) return value.asString();
-  std::string joined;
-  for (const Json::Value& element : value) joined += (joined.empty() ? "" : "; ") + FriendlyValue(field, element);
-  return joined;
-}
-
 /// One field, indented below the path. `value` is escaped already.
 void PrintLine(const std::string& name, const std::string& value) {
   (void)printf("    %s: %s\n", EscapeForTerminal(name).c_str(), value.c_str());
@@ -79,6 +60,24 @@ void PrintText(const Json::Value& document, const std::string& text) {
 
 }  // namespace
 
+std::string FriendlyName(const std::string& field) {
+  for (const char* prefix : {"_KOVAMD", "_KOVA", "KOVAMD", "KOVA"}) {
+    if (StringStartWith(field, prefix)) return field.substr(std::string(prefix).size());
+  }
+  return field;
+}
+
+/// Fields that end in "Date" hold seconds.
+std::string FieldText(const std::string& field, const Json::Value& value) {
+  const bool is_date = field.size() > 4 && field.compare(field.size() - 4, 4, "Date") == 0;
+  if (is_date && value.isInt64()) return Date(value.asInt64());
+  if (value.isString()) return EscapeOneLine(value.asString());
+  if (value.isNumeric() || value.isBool()) return value.asString();
+  std::string joined;
+  for (const Json::Value& element : value) joined += (joined.empty() ? "" : "; ") + FieldText(field, element);
+  return joined;
+}
+
 void PrintDocument(const Json::Value& document, const std::string& text, Fields fields) {
   (void)printf("%s\n", EscapeForTerminal(TextOf(document, kKOVAMDPath)).c_str());
   if (fields == Fields::kAll || BoolOf(document, kKOVAMDIsDir)) PrintLine("content", Reading(document));
@@ -87,7 +86,7 @@ void PrintDocument(const Json::Value& document, const std::string& text, Fields 
   for (const std::string& field : document.getMemberNames()) {
     const bool is_shown =
         std::find(std::begin(kShownElsewhere), std::end(kShownElsewhere), field) != std::end(kShownElsewhere);
-    if (!is_shown) PrintLine(FriendlyName(field), FriendlyValue(field, document[field]));
+    if (!is_shown) PrintLine(FriendlyName(field), FieldText(field, document[field]));
   }
   PrintText(document, text);
 }

@@ -17,6 +17,11 @@ enum class Fields {
 /// Everything that the index has of the file, the fields under short names, and the beginning of `text`.
 void PrintDocument(const Json::Value& document, const std::string& text, Fields fields);
 
+/// "KOVAMDTitle" is "Title", "KOVAStateOrProvince" "StateOrProvince".
+std::string FriendlyName(const std::string& field);
+/// A field's value in one line, escaped: seconds as a date, a list joined.
+std::string FieldText(const std::string& field, const Json::Value& value);
+
 /// A text as it is; on a terminal made safe for it.
 void PrintWholeText(const std::string& text);
 

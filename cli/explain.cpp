@@ -4,12 +4,15 @@
 
 #include <cerrno>
 #include <cstring>
+#include <vector>
 
 #include <kova/fs.h>
 #include <kova/lock_holder.h>
 
+#include "cli/did_you_mean.h"
 #include "common/file_util.h"
 #include "common/subject_error.h"
+#include "fileindex/folders/folder_mgr.h"
 #include "fileindex/util.h"
 #include "platform/host/share_table.h"
 #include "sdk/share.h"
@@ -82,6 +85,20 @@ std::string SettingsProblem(const Error& error) {
   }
 }
 
+/// Names to choose from; none where they cannot be read, which other messages say.
+std::vector<std::string> SharesThere() try { return sdk::SDKShare::Enum(); } catch (const Error&) {
+  return {};
+}
+
+std::vector<std::string> FoldersThere() try {
+  const fileindex::FolderMgr configured;
+  std::vector<std::string> paths;
+  for (const auto& folder : configured.GetFolders()) paths.push_back(folder->GetPath());
+  return paths;
+} catch (const Error&) {
+  return {};
+}
+
 /// What went wrong. The library gives some of its reasons as a bare name.
 std::string Sentence(const Error& error) {
   const Subject subject = SubjectError::Of(error);
@@ -92,9 +109,9 @@ std::string Sentence(const Error& error) {
   const std::string reason = error.what();
   switch (error.Code()) {
     case Error::kNoSuchShare:
-      return "there is no share \"" + reason + "\"";
+      return "there is no share \"" + reason + "\"" + DidYouMean(reason, SharesThere());
     case Error::kNoSuchFolder:
-      return reason + " is no indexed folder";
+      return reason + " is no indexed folder" + DidYouMean(reason, FoldersThere());
     case Error::kTooManyFolders:
       return "there would be too many indexed folders: at most 1000";
     default:
@@ -166,7 +183,7 @@ std::string Explain(const Error& error, const std::string& note) {
     return problem + (note.empty() ? "" : "; " + note) + " (error " + std::to_string(error.Code()) + ")";
   std::string text = Sentence(error);
   for (const std::string& part : {RemedyFor(error), note}) {
-    if (!part.empty()) text += "; " + part;
+    if (!part.empty()) text += (text.back() == '?' ? " " : "; ") + part;
   }
   return text + " (error " + std::to_string(error.Code()) + ")";
 }

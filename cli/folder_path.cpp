@@ -9,6 +9,7 @@
 
 #include "base/path.h"
 #include "cli/command.h"
+#include "cli/did_you_mean.h"
 #include "cli/own_share.h"
 #include "cli/rights.h"
 #include "common/error.h"
@@ -41,9 +42,22 @@ std::string FullPathInShare(const std::string& share_path) {
   return sdk::SDKShare(name).GetPath() + share_path.substr(1 + name.size());
 }
 
+/// What a path may be meant as that is neither a share path nor on the disk: an indexed folder, a share, or the same
+/// path below a share of a name that is spelt alike.
+std::string PathMeant(const std::string& text, const fileindex::FolderMgr& configured) {
+  std::vector<std::string> known;
+  for (const auto& folder : configured.GetFolders()) known.push_back(folder->GetPath());
+  const size_t end = text.empty() || text[0] != '/' ? std::string::npos : text.find('/', 1);
+  for (const std::string& share : sdk::SDKShare::Enum()) {
+    known.push_back("/" + share);
+    if (end != std::string::npos) known.push_back("/" + share + text.substr(end));
+  }
+  return DidYouMean(text, known);
+}
+
 /// The share path of what lies on disk, where a share holds it under this path; else why not. A path through a link is
 /// refused and not followed: nothing is indexed under such a path, and the list would show another than was given.
-std::string OnDisk(const std::string& text) {
+std::string OnDisk(const std::string& text, const fileindex::FolderMgr& configured) {
   const std::string path = AbsolutePath(text);
   const std::string share_path = SharePathOnDisk(path);
   if (!share_path.empty()) return share_path;
@@ -52,10 +66,13 @@ std::string OnDisk(const std::string& text) {
     throw Failure(text + " is, without links, " + real + "; give that path");
   }
   if (real.empty()) (void)Exists(path);
-  throw Failure(text +
-                (real.empty() ? " is neither in a share nor on the disk"
-                              : " lies in no share; 'fileindexctl share add' makes it one") +
-                ("; 'fileindexctl share list' shows the shares"));
+  if (!real.empty()) {
+    throw Failure(text + " lies in no share; 'fileindexctl share add " + real + "' makes it one, 'fileindexctl share " +
+                  "list' shows the shares");
+  }
+  const std::string meant = PathMeant(text, configured);
+  throw Failure(text + " is neither in a share nor on the disk" + meant + (meant.empty() ? ";" : "") +
+                " 'fileindexctl share list' shows the shares");
 }
 
 }  // namespace
@@ -103,11 +120,11 @@ std::string AbsolutePath(const std::string& text) {
 std::string ToSharePath(const std::string& text, const fileindex::FolderMgr& configured) {
   if (text.empty()) throw UsageError("an empty path is no folder");
   if (configured.HasFolder(text)) return text;
-  if (text[0] != '/') return OnDisk(text);
+  if (text[0] != '/') return OnDisk(text, configured);
   const std::string cleaned = CleanPath(text, false);
   if (configured.HasFolder(cleaned)) return cleaned;
   const std::string in_share = FullPathInShare(cleaned);
-  if (in_share.empty()) return OnDisk(text);
+  if (in_share.empty()) return OnDisk(text, configured);
   const std::string as_disk_path = SharePathOnDisk(cleaned);
   // "/photo/a" is a share path and may be a path on disk: where only the latter exists, that is meant.
   return !as_disk_path.empty() && !Exists(in_share) && Exists(cleaned) ? as_disk_path : cleaned;

@@ -6,17 +6,14 @@
 
 #include "cli/escape.h"
 #include "cli/format.h"
+#include "cli/hit_view.h"
 #include "cli/output.h"
 #include "cli/search_notes.h"
-#include "fileindex/elastic/elastic_control.h"
-#include "fileindex/util.h"
-#include "wire/fields.h"
+#include "cli/terminal.h"
 
 namespace ferrox::cli {
 
 namespace {
-
-namespace field = fileindex::elastic;
 
 /// Hits that one call shows: what fits on a screen, and the most that may be asked for.
 constexpr long long kLimitDefault = 10;
@@ -25,59 +22,12 @@ constexpr long long kOffsetMax = 1000000000;
 /// How long --fresh waits unless it says otherwise, and at most.
 constexpr long long kFreshSeconds = 30;
 constexpr long long kFreshSecondsMax = 600;
-/// What the engine puts around a match. Not shown: each becomes what the output can show.
-constexpr char kMarkStart = '\x02';
-constexpr char kMarkEnd = '\x03';
 
 /// The query as one text. The shell has taken one pair of quotes away: a phrase is given as '"a phrase"'.
 std::string JoinWords(const std::vector<std::string>& words) {
   std::string query;
   for (const std::string& word : words) query += (query.empty() ? "" : " ") + word;
   return query;
-}
-
-/// In one word. What is no folder goes by its extension, as it does for the choice of what is read.
-std::string KindOf(const Json::Value& fields, const std::string& path) {
-  constexpr const char* kKinds[] = {"document", "audio", "video", "image", "other"};
-  if (BoolOf(fields, field::kKOVAMDIsDir)) return "folder";
-  return kKinds[fileindex::GetFileTypeByFullPath(path)];
-}
-
-/// A part of the text with the matches shown: bold on a terminal, in brackets elsewhere. The text comes from files and
-/// is escaped between the marks, so that no file can draw on the terminal.
-std::string ShowSnippet(const std::string& snippet, bool on_terminal) {
-  std::string shown;
-  std::string part;
-  for (const char byte : snippet + kMarkEnd) {
-    if (byte != kMarkStart && byte != kMarkEnd) {
-      part += byte;
-      continue;
-    }
-    shown += EscapeOneLine(part);
-    part.clear();
-    if (byte == kMarkStart) {
-      shown += on_terminal ? "\033[1m" : "[";
-    } else {
-      shown += on_terminal ? "\033[0m" : "]";
-    }
-  }
-  const size_t end = on_terminal ? 4 : 1;  // the mark that closed the last part
-  return shown.substr(0, shown.size() - end);
-}
-
-/// The path, the title, what matched in the text, a line of facts, and what the score is made of where it is told.
-void PrintHit(const Json::Value& hit, bool on_terminal) {
-  const Json::Value& fields = hit["fields"];
-  const std::string path = TextOf(hit, "doc_id");
-  const std::string shown = EscapeForTerminal(path);
-  (void)printf("%s\n", on_terminal ? ("\033[36m" + shown + "\033[0m").c_str() : shown.c_str());
-  const std::string title = TitleToShow(hit, path);
-  if (!title.empty()) (void)printf("    %s\n", title.c_str());
-  const std::string snippet = TextOf(hit, "snippet");
-  if (!snippet.empty()) (void)printf("    %s\n", ShowSnippet(snippet, on_terminal).c_str());
-  (void)printf("    %s, %s, %s\n", KindOf(fields, path).c_str(), Size(IntOf(fields, field::kKOVAMDFSSize)).c_str(),
-               Date(IntOf(fields, field::kKOVAMDFSContentChangeDate)).c_str());
-  PrintExplanation(hit);
 }
 
 /// Whether hits follow behind those of this page. Of a user's page all may be gone that were to be shown: files that
@@ -111,8 +61,9 @@ Json::Value SearchMembers(const Arguments& arguments) {
   if (arguments.Has("--all-words")) data["all_words"] = true;
   if (arguments.Has("--explain")) data["explain"] = true;
   const bool json = arguments.Has("--json");
-  data["mark_start"] = json ? "[" : std::string(1, kMarkStart);
-  data["mark_end"] = json ? "]" : std::string(1, kMarkEnd);
+  if (isatty(STDOUT_FILENO) == 1 && !json) data["tell_fields"] = true;
+  data["mark_start"] = json ? "[" : std::string(1, kMatchBegin);
+  data["mark_end"] = json ? "]" : std::string(1, kMatchEnd);
   return data;
 }
 
@@ -137,9 +88,9 @@ int PrintFound(const Arguments& arguments, Found found) {
   if (arguments.Has("--json")) {
     PrintJson(result);
   } else if (hits > 0 || HasMore(result, offset)) {
-    const bool on_terminal = isatty(STDOUT_FILENO) == 1;
+    const Terminal terminal = Terminal::OfOutput();
     PrintHowSearched(result);
-    for (const Json::Value& hit : result["hits"]) PrintHit(hit, on_terminal);
+    for (const Json::Value& hit : result["hits"]) PrintHit(hit, result["asked"], terminal);
     PrintSummary(result, offset);
   } else if (found.searched) {
     PrintNothingFound(result, found.left_out.Empty());

@@ -3,6 +3,7 @@
 #include <algorithm>
 
 #include "cli/command.h"
+#include "cli/did_you_mean.h"
 #include "cli/format.h"
 
 namespace ferrox::cli {
@@ -14,7 +15,8 @@ Kinds::Kinds(const std::string& text) {
   for (const std::string& name : Split(text, ',')) {
     const auto kind = std::find(kKinds.begin(), kKinds.end(), name);
     if (kind == kKinds.end()) {
-      throw UsageError("--kinds takes document, audio, video, photo, joined with commas; or all, or none");
+      throw UsageError("--kinds takes document, audio, video, photo, joined with commas; or all, or none; not \"" +
+                       name + "\"" + DidYouMean(name, {kKinds.begin(), kKinds.end()}));
     }
     chosen_[static_cast<size_t>(kind - kKinds.begin())] = true;
   }

@@ -9,6 +9,7 @@
 #include "cli/escape.h"
 #include "cli/explain.h"
 #include "cli/global_options.h"
+#include "cli/help.h"
 #include "cli/output.h"
 #include "cli/rights.h"
 #include "common/error.h"
@@ -24,34 +25,33 @@ namespace {
 
 using namespace ferrox::cli;  // NOLINT: the tool's own
 
-/// The whole help: all commands by their groups, a line each.
-std::string Overview() {
-  std::string text =
-      "Usage: fileindexctl [--root DIR] COMMAND ...\n"
-      "Searches the contents of folders, and looks after what that needs.\n\n";
-  constexpr size_t kWidth = 32;
-  for (const CommandGroup& group : CommandTable()) {
-    text += std::string(group.title) + ":\n";
-    for (const Command& command : group.commands) {
-      const std::string left = std::string(command.name) + " " + command.words;
-      text += "  " + left + std::string(left.size() < kWidth ? kWidth - left.size() : 1, ' ') + command.help + "\n";
-    }
-    text += "\n";
-  }
-  return text +
-         "  --root DIR   the instance's folder (default: the environment variable FERROX_ROOT, else the host's own)\n"
-         "  --version    the version\n"
-         "  --help       this text, or after a command that command's help\n"
-         "Exit codes: 0 done, 1 nothing found, 2 wrong usage, 3 failure, 4 something was left out,\n"
-         "5 not permitted to this user.\n";
+/// "help search --help" asks once.
+std::vector<std::string> WithoutHelp(std::vector<std::string> words) {
+  if (!words.empty() && (words.back() == "--help" || words.back() == "-h")) words.pop_back();
+  return words;
 }
 
-/// Takes the options that stand before the command. True when one of them has done all there was to do.
+/// Whether help is asked for behind a command, or behind the first word of several commands. "-h" is a word of a query.
+bool AsksForHelp(const std::vector<std::string>& words) {
+  const std::string& last = words.back();
+  if (words.size() < 2 || words.size() > 3) return false;
+  return last == "--help" || (last == "-h" && (words.size() == 2 || words[0] != "search"));
+}
+
+/// Takes the options that stand before the command, and "help". True when one of them has done all there was to do.
 bool TakeGlobalOptions(std::vector<std::string>& words) {
   TakeRoot(words);
-  if (words.empty() || words[0].compare(0, 2, "--") != 0) return false;
-  if (words[0] != "--help" && words[0] != "--version") throw UsageError("unknown option " + words[0]);
-  (void)fputs(words[0] == "--help" ? Overview().c_str() : "fileindexctl " FERROX_VERSION "\n", stdout);
+  if (words.empty()) return false;
+  const std::string& first = words[0];
+  if (first == "help" || first == "--help" || first == "-h") {
+    (void)fputs(HelpOn(WithoutHelp({words.begin() + 1, words.end()})).c_str(), stdout);
+  } else if (first == "--version") {
+    (void)fputs("fileindexctl " FERROX_VERSION "\n", stdout);
+  } else if (first[0] == '-') {
+    ThrowNoGlobalOption(first);
+  } else {
+    return false;
+  }
   return true;
 }
 
@@ -71,22 +71,20 @@ void PrepareInstance(Needs needs) {
   ferrox::services::GuardLockFiles();
 }
 
-/// A word that begins names of two words is answered with what can follow it.
-[[noreturn]] void ThrowNoCommand(const std::string& word) {
-  std::string known;
-  for (const std::string& second : Completions({word, ""})) known += (known.empty() ? "" : ", ") + second;
-  if (!known.empty()) throw UsageError(word + " is followed by one of: " + known);
-  throw UsageError("there is no command \"" + EscapeForTerminal(word) + "\"");
-}
-
 /// Finds the command, parses its arguments, prepares the instance and runs it. Help needs no instance.
 int Run(std::vector<std::string> words) {
   if (!words.empty() && words[0] == kCompleteCommand) return PrintCompletions({words.begin() + 1, words.end()});
   if (TakeGlobalOptions(words)) return kDone;
-  if (words.empty()) throw UsageError("say what to do");
+  if (words.empty()) {
+    throw UsageError("a command is missing; for example: fileindexctl search invoice 2024\nTry 'fileindexctl help'.");
+  }
+  if (AsksForHelp(words)) {
+    (void)fputs(HelpOn(WithoutHelp(words)).c_str(), stdout);
+    return kDone;
+  }
   size_t name_words = 0;
   const Command* command = FindCommand(words, name_words);
-  if (command == nullptr) ThrowNoCommand(words[0]);
+  if (command == nullptr) ThrowNoCommand(words);
   words.erase(words.begin(), words.begin() + static_cast<std::ptrdiff_t>(name_words));
   try {
     const Arguments arguments = ParseArguments(*command, words);
@@ -98,7 +96,7 @@ int Run(std::vector<std::string> words) {
     PrepareInstance(command->needs);
     return command->run(arguments);
   } catch (const UsageError& error) {
-    throw UsageError(std::string(error.what()) + "\nUsage: " + UsageLine(*command));
+    throw UsageError(WithUsage(*command, error.what()));
   }
 }
 
@@ -113,7 +111,7 @@ int main(int argc, char** argv) {
     FlushOutput();
     return code;
   } catch (const UsageError& error) {
-    (void)fprintf(stderr, "fileindexctl: %s\nTry 'fileindexctl --help'.\n", EscapeText(error.what()).c_str());
+    (void)fprintf(stderr, "fileindexctl: %s\n", EscapeText(error.what()).c_str());
     return kWrongUsage;
   } catch (const NotPermitted& error) {
     Warn(error.what());

@@ -1,6 +1,5 @@
 #include "cli/progress.h"
 
-#include <sys/ioctl.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -8,6 +7,7 @@
 
 #include "cli/escape.h"
 #include "cli/format.h"
+#include "cli/terminal.h"
 
 namespace ferrox::cli {
 
@@ -17,12 +17,6 @@ namespace {
 constexpr std::chrono::seconds kLineInterval(2);
 /// In characters, without the brackets.
 constexpr size_t kBarWidth = 24;
-
-/// Asked each time, since windows change. 80 where the terminal does not say.
-size_t TerminalColumns() {
-  winsize size = {};
-  return ioctl(STDERR_FILENO, TIOCGWINSZ, &size) == 0 && size.ws_col > 0 ? size.ws_col : 80;
-}
 
 }  // namespace
 
@@ -59,7 +53,7 @@ std::string Progress::Text(const Json::Value& share, size_t bar_width) {
 /// Cut to the width of the terminal: a line that wraps could not be replaced.
 void Progress::Show(const Json::Value& share) {
   if (on_terminal_) {
-    const std::string text = EscapeForTerminal(Text(share, kBarWidth)).substr(0, TerminalColumns() - 1);
+    const std::string text = EscapeForTerminal(Text(share, kBarWidth)).substr(0, ColumnsOf(STDERR_FILENO) - 1);
     (void)fprintf(stderr, "\r\033[K%s", text.c_str());
     shown_ = true;
     return;

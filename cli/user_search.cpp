@@ -3,6 +3,7 @@
 
 #include "cli/as_user.h"
 #include "cli/ask.h"
+#include "cli/did_you_mean.h"
 #include "cli/escape.h"
 #include "cli/format.h"
 #include "cli/hits.h"
@@ -84,6 +85,14 @@ bool IsLeftOut(int code) {
          code == Error::kEngineIndexUpgrading;
 }
 
+/// The end of the engine's sentence about a share that does not exist for this user.
+std::string ShareMeant(const Refusal& refusal, const std::vector<std::string>& named, const Json::Value& as) try {
+  if (refusal.Code() != Error::kEngineNoSuchIndex || named.size() != 1) return "";
+  return DidYouMean(named[0], AllShares(as));
+} catch (const Failure&) {
+  return "";  // what is wrong has been said
+}
+
 void SearchShares(Json::Value data, const std::vector<std::string>& shares, Found& found) try {
   if (!shares.empty()) data["shares"] = NamesAsJson(shares);
   const size_t before = found.left_out.Unsearched();
@@ -96,7 +105,7 @@ void SearchShares(Json::Value data, const std::vector<std::string>& shares, Foun
   if (found.result["not_noticed"] == true) found.not_noticed = kNotAllNoticed;
 } catch (const Refusal& refusal) {
   if (refusal.Code() == Error::kEngineBadRequest) throw UsageError(EscapeForTerminal(refusal.Reason()));
-  if (!IsLeftOut(refusal.Code())) throw Failure(refusal.Reason());
+  if (!IsLeftOut(refusal.Code())) throw Failure(refusal.Reason() + ShareMeant(refusal, shares, data["as"]));
   found.left_out.AddForUser(shares.size() == 1 ? shares[0] : "", refusal.Code(), refusal.Reason());
   found.result = NothingSearched();
   found.searched = false;

@@ -1,6 +1,9 @@
 #include <cstdio>
+#include <string>
+#include <vector>
 
 #include "cli/ask.h"
+#include "cli/did_you_mean.h"
 #include "cli/escape.h"
 #include "cli/format.h"
 #include "cli/output.h"
@@ -28,11 +31,24 @@ std::string StateText(const Json::Value& share) {
   return reason.empty() ? text : text + ": " + reason;
 }
 
+/// @throws Failure when it is none that the user may enter.
+Json::Value OnlyShare(const Json::Value& shares, const std::string& name) {
+  std::vector<std::string> names;
+  Json::Value only(Json::arrayValue);
+  for (const Json::Value& share : shares) {
+    names.push_back(TextOf(share, "share"));
+    if (names.back() == name) only.append(share);
+  }
+  if (only.empty()) throw Failure("there is no share \"" + name + "\" that you may enter" + DidYouMean(name, names));
+  return only;
+}
+
 }  // namespace
 
 int RunUserStatus(const Arguments& arguments) {
   constexpr std::chrono::seconds kLongest(20);
-  const Json::Value shares = AskEngine(wire::EngineRequest("shares"), kLongest);
+  Json::Value shares = AskEngine(wire::EngineRequest("shares"), kLongest);
+  if (!arguments.words.empty()) shares = OnlyShare(shares, arguments.words[0]);
   if (arguments.Has("--json")) {
     Json::Value json;
     json["shares"] = shares.isArray() ? shares : Json::Value(Json::arrayValue);

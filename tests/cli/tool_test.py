@@ -1,5 +1,6 @@
 """The tool on an instance without daemons: usage, remedies, paths, completion."""
 
+import fcntl
 import json
 import os
 import re
@@ -8,6 +9,7 @@ import socket
 import struct
 import subprocess
 import tempfile
+import termios
 import threading
 import time
 import unittest
@@ -71,7 +73,9 @@ def failure(message):
     return {"success": False, "error": {"code": 502, "msg": message}}
 
 
-class ToolTest(unittest.TestCase):
+class ToolCase(unittest.TestCase):
+    """An instance with two shares and three indexed folders, of which one is in a share that is gone."""
+
     def setUp(self):
         self.root = os.path.realpath(tempfile.mkdtemp(prefix="fi-"))
         self.addCleanup(shutil.rmtree, self.root)
@@ -87,13 +91,21 @@ class ToolTest(unittest.TestCase):
     def run_tool(self, *words, cwd="/"):
         return subprocess.run([TOOL, *words], env=self.env, cwd=cwd, capture_output=True, timeout=60, check=False)
 
+    def daemon(self, name, **answers):
+        daemon = FakeDaemon(self.root, name, answers)
+        self.addCleanup(daemon.close)
+        return daemon
+
+
+class ToolTest(ToolCase):
     def complete(self, *words):
         return self.run_tool("complete-words", *words).stdout.decode().splitlines()
 
     def commands(self):
         for first in self.complete(""):
-            if not first.startswith("-"):
-                seconds = self.complete(first, "") if self.run_tool(first, "--help").returncode else []
+            if not first.startswith("-") and first != "help":
+                of_two = b"COMMAND ..." in self.run_tool(first, "--help").stdout
+                seconds = self.complete(first, "") if of_two else []
                 yield from [[first, second] for second in seconds] or [[first]]
 
     def test_folder_is_named_as_people_would(self):
@@ -131,8 +143,9 @@ class ToolTest(unittest.TestCase):
     def given(self, command, words, otherwise):
         """What the usage of a command asks for, each from `words` by its name."""
         usage = self.run_tool(*command.split(), "--help").stdout.decode().splitlines()[0].split(command, 1)[1]
-        named = re.findall(r"(?<!\S)[A-Z]\w+", re.sub(r"\[--\w.*?\]+ ?", "", usage))
-        return [words.get(word, otherwise) for word in named]
+        required = re.sub(r"\[--\w.*?\]+ ?", "", usage)
+        named = re.findall(r"(?<!\S)[A-Z]\w+", required.replace("--kinds KINDS", ""))
+        return [words.get(word, otherwise) for word in named] + ["--kinds", "all"] * ("--kinds" in required)
 
     def test_damaged_table_of_shares_is_named_by_every_command(self):
         path = f"{self.root}/etc/kova/shares.json"
@@ -161,9 +174,9 @@ class ToolTest(unittest.TestCase):
             (2, "Try", []),
             (2, "no command", ["nonsense", "add"]),
             (2, r"unknown option --\x1B[2J\xE2\x80\xAE", ["search", "--\x1b[2J\u202e"]),
-            (2, "add, delete, get", ["folder", "nonsense"]),
+            (2, "add, set, delete", ["folder", "nonsense"]),
             (2, "--kinds takes", ["folder", "add", "--kinds", "music", "/photo"]),
-            (2, "--kinds is needed", ["folder", "set", "/photo"]),
+            (2, "--kinds is missing", ["folder", "set", "/photo"]),
             (2, "--name goes with one", ["folder", "add", "/photo", "/photos", "--name", "x"]),
             (2, "--sort takes one of", ["folder", "list", "--sort", "size"]),
             (2, "missing", ["share", "rename", "a"]),
@@ -192,11 +205,6 @@ class ToolTest(unittest.TestCase):
                 done = self.run_tool(*words)
                 self.assertEqual(code, done.returncode, done.stderr)
                 self.assertIn(text, done.stderr.decode())
-
-    def daemon(self, name, **answers):
-        daemon = FakeDaemon(self.root, name, answers)
-        self.addCleanup(daemon.close)
-        return daemon
 
     def test_fresh_search_asks_both_daemons_first_or_shows_nothing(self):
         engine = self.daemon("kovaelasticd", search=success({"total": 1, "hits": [{"doc_id": "/v/f", "fields": {}}]}))
@@ -375,6 +383,40 @@ class ToolTest(unittest.TestCase):
         answer = {"total": 0, "hits": [], "suggestions": ["runs"]}
         self.assertIn(b"nothing found. Did you mean: runs?\n", self.run_tool("search", "x").stderr)
 
+    def on_terminal(self, *words, **env):
+        """What the tool writes to a terminal of 60 columns."""
+        terminal, output = os.openpty()
+        fcntl.ioctl(output, termios.TIOCSWINSZ, struct.pack("HHHH", 24, 60, 0, 0))
+        with subprocess.Popen([TOOL, *words], env=dict(self.env, **env), stdout=output, stderr=output) as tool:
+            os.close(output)
+            shown = b""
+            try:
+                while piece := os.read(terminal, 65536):
+                    shown += piece
+            except OSError:
+                pass  # how a terminal ends that nobody has open any more
+            tool.wait(60)
+        os.close(terminal)
+        return shown.decode().replace("\r\n", "\n")
+
+    def test_hits_on_a_terminal(self):
+        model = {"KOVAMDAcquisitionMake": "NIKON", "KOVAMDAcquisitionModel": "NIKON D750\x1b"}
+        passage = "a long \x02pas\u202esage\x03 that goes on until it needs a line more, with \u65e5\u672c\u8a9e wider than it is long"
+        hits = [{"doc_id": "/v/trips/a b\x1b.jpg", "title": "Lisbon", "snippet": passage, "fields": model},
+                {"doc_id": "/v/trips/b.jpg", "fields": {}}]
+        engine = self.daemon("kovaelasticd", search=success({"total": 2, "hits": hits, "left_out": [], "asked": [
+            {"name": "camera", "fields": list(model)}]}))
+        plain = self.on_terminal("search", "camera:nikon", TERM="xterm", VTE_VERSION="7000", NO_COLOR="1")
+        self.assertTrue(engine.asked[0][1]["tell_fields"])
+        self.assertTrue(plain.startswith(
+            "Lisbon\n    /v/trips/a b\\x1B.jpg\n    a long [pas\\xE2\\x80\\xAEsage] that goes on until it needs\n"
+            "    a line more, with \u65e5\u672c\u8a9e wider than it is long\n"
+            "    camera: NIKON, NIKON D750\\x1B\n    image, 0 B, -\n\nb.jpg\n    /v/trips\n    image, "), plain)
+        styled = self.on_terminal("search", "camera:nikon", TERM="xterm", VTE_VERSION="7000", TMUX="", NO_COLOR="")
+        self.assertRegex(styled, "\033]8;;file://[^/]+/v/trips/a%20b%1B.jpg\033.\033\\[1;36mLisbon\033\\[0m\033]8;;\033")
+        self.assertNotIn("\033]8", self.on_terminal("search", "x", TERM="linux", VTE_VERSION=""))
+        self.assertNotIn("tell_fields", (self.run_tool("search", "x"), engine.asked)[1][-1][1])
+
     def test_status_tells_how_changes_are_noticed(self):
         shares = [{"share": name, "path": "/v/" + name, "queue": "/q/" + name, "state": "idle", "oldest_change": 2000,
                    "failures": {}, "index": {"error": {"code": 1407, "msg": name + " is torn"}}}
@@ -468,7 +510,8 @@ class ToolTest(unittest.TestCase):
             (["search", "x"], {"search": success(found)}, 0, "/v/photo/f\n.*3 found, 1 to 1 shown; more: --offset 2\n$", None),
             (["search", "x"], {"search": success(dict(found, left_out=[out]))}, 4, "left out: share photos: 62 %", None),
             (["search", "--share", "a", "--share", "b", "x"], {"search": success(found)}, 0, "", ["a", "b"]),
-            (["search", "--share", "a", "x"], {"search": refused(1404, 'there is no share "a" here')}, 3, 'no share "a"', ["a"]),
+            (["search", "--share", "phot", "x"], {"search": refused(1404, 'there is no share "phot" here'), "shares": shares},
+             3, 'no share "phot" here. Did you mean: photo', ["phot"]),
             (["search", "--share", "photos", "x"], {"search": refused(1412, "it is being prepared, 62 %")}, 4, "62 %", ["photos"]),
             (["search", "x"], {"search": refused(1406, "this is an instance of user ann")}, 5, "ctl: this is an instance", None),
             (["search", "x"], {"search": refused(1414, "too many at work")}, 3, "too many at work", None),

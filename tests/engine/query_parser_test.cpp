@@ -7,6 +7,7 @@
 #include <gtest/gtest.h>
 
 #include "common/error.h"
+#include "services/kovaelasticd/query/asked_fields.h"
 #include "services/kovaelasticd/query/query.h"
 
 namespace ferrox::engine {
@@ -188,6 +189,14 @@ TEST_F(QueryParserTest, RefusalsNameThePlaceAndTheRemedy) {
     for (size_t i = 0; i <= kQueryMaxTerms; ++i) many += condition;
     EXPECT_NE(Refusal(many).find("leave some out"), std::string::npos);
   }
+}
+
+TEST_F(QueryParserTest, FieldsThatAreAskedForAreTold) {
+  std::string told;
+  const QueryNode query =
+      ParseQuery("lisbon camera:nikon (taken:2023 OR camera:canon) KOVAMDLyricist:x -artist:y ext:jpg", kNow);
+  for (const AskedFields& asked : FieldsAskedFor(query)) told += asked.name + "=" + asked.fields[0] + " ";
+  EXPECT_EQ("camera=KOVAMDAcquisitionMake taken=KOVAMDContentCreationDate KOVAMDLyricist=KOVAMDLyricist ", told);
 }
 
 }  // namespace

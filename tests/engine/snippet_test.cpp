@@ -20,6 +20,7 @@ TEST(SnippetTest, WordsAreMarkedAsTheyStand) {
 }
 
 TEST(SnippetTest, ControlCharactersAndForeignBytesAreHarmless) {
+  EXPECT_EQ(Snippet("a\xD8\x9C\xE2\x80\x8F fox\xE2\x80\xA8z", {{"fox", false}}), "a [fox] z");
   EXPECT_EQ(Snippet("a\x1B[31m\n\t\x01 fox\x07 caf\xE9\x00z", {{"fox", false}}), "a [31m [fox] caf\xEF\xBF\xBD");
   EXPECT_EQ(Snippet("fox \xE2\x80\xAEgpj.exe \xC2\x9Bx", {{"fox", false}}), "[fox] gpj.exe x");
 }

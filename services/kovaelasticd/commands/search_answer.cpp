@@ -1,6 +1,7 @@
 #include "services/kovaelasticd/commands/search_answer.h"
 
 #include "common/json_util.h"
+#include "services/kovaelasticd/query/asked_fields.h"
 
 namespace ferrox::engine {
 
@@ -31,6 +32,14 @@ void AddTotalsAndWords(Json::Value& result, const MergedReply& found) {
   for (const RepairedWord& word : found.repaired) result["repaired"].append(RepairedJson(word));
   if (found.none_has_all) result["none_has_all"] = true;
   if (found.total == 0 && !found.suggestions.empty()) result["suggestions"] = Vec2JsonArr(found.suggestions);
+}
+
+void AddFieldsAskedFor(Json::Value& result, const QueryNode& query) {
+  for (const AskedFields& asked : FieldsAskedFor(query)) {
+    Json::Value& entry = result["asked"].append(Json::Value());
+    entry["name"] = asked.name;
+    entry["fields"] = Vec2JsonArr(asked.fields);
+  }
 }
 
 Json::Value HitForAll(const SearchHit& found) {

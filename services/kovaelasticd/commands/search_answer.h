@@ -11,6 +11,9 @@ namespace ferrox::engine {
 /// were searched for the asker.
 void AddTotalsAndWords(Json::Value& result, const MergedReply& found);
 
+/// Sets "asked": the fields that the query has conditions on, by the names that people give them. Absent: none.
+void AddFieldsAskedFor(Json::Value& result, const QueryNode& query);
+
 /// The members of a hit that are the same for everyone: "doc_id", "score", "snippet", "title", "explain".
 Json::Value HitForAll(const SearchHit& found);
 

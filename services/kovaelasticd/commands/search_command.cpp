@@ -104,6 +104,7 @@ Json::Value RunSearch(CommandCall& call) {
   Json::Value result =
       asker.has_value() ? SearchForUser(call, *asker, request, query) : SearchEverything(call, request, query);
   if (!query.hints.empty()) result["hints"] = Vec2JsonArr(query.hints);
+  if (OptionalBool(call.data, "tell_fields", false)) AddFieldsAskedFor(result, query.tree);
   return result;
 }
 

@@ -1,8 +1,6 @@
 #include "services/kovaelasticd/query/field_names.h"
 
-#include <algorithm>
-#include <utility>
-
+#include "base/edit_distance.h"
 #include "base/text.h"
 #include "services/kovaelasticd/query/query_values.h"
 #include "services/kovaelasticd/text/schema.h"
@@ -65,20 +63,6 @@ const FriendlyName kFriendlyNames[] = {
 
 std::string LowerName(std::string_view name) { return base::LowerAscii(std::string(name)); }
 
-/// Whether one insertion, removal, change or swap of neighbours makes one of the other.
-bool IsOneSlip(std::string_view a, std::string_view b) {
-  if (a.size() > b.size()) std::swap(a, b);
-  if (b.size() > a.size() + 1) return false;
-  const auto same = static_cast<size_t>(std::mismatch(a.begin(), a.end(), b.begin()).first - a.begin());
-  const std::string_view rest = a.substr(same);
-  const std::string_view other = b.substr(same);
-  if (a.size() != b.size()) return rest == other.substr(1);
-  if (rest.empty()) return false;
-  const bool swapped =
-      rest.size() > 1 && rest[0] == other[1] && rest[1] == other[0] && rest.substr(2) == other.substr(2);
-  return swapped || rest.substr(1) == other.substr(1);
-}
-
 }  // namespace
 
 ConditionType ConditionTypeOf(std::string_view name) {
@@ -99,6 +83,16 @@ std::vector<std::string> FriendlyFields(std::string_view name) {
   return {};
 }
 
+std::string NameOfFields(const std::vector<std::string>& fields) {
+  for (const FriendlyName& known : kFriendlyNames) {
+    if (known.fields == fields) return known.name;
+  }
+  for (const RangeField& known : RangeFields()) {
+    if (known.fields == fields) return known.name;
+  }
+  return fields[0];
+}
+
 bool IsFullFieldName(std::string_view name) { return name.starts_with("KOVA") || name.starts_with("_KOVAMD"); }
 
 bool IsFieldName(std::string_view name) {
@@ -107,10 +101,11 @@ bool IsFieldName(std::string_view name) {
 }
 
 std::string FieldMeantBy(std::string_view name) {
-  const auto meant = [&name](std::string_view known) {
-    return known.size() >= kMeantLettersMin && IsOneSlip(name, known);
-  };
   if (name.size() < kMeantLettersMin) return {};
+  base::EditDistance distances(name, 1);
+  const auto meant = [&distances](std::string_view known) {
+    return known.size() >= kMeantLettersMin && distances.DistanceOf(known) == 1;
+  };
   for (const ConditionName& known : kConditionNames) {
     if (meant(known.name)) return known.name;
   }

@@ -16,6 +16,10 @@ ConditionType ConditionTypeOf(std::string_view name);
 /// The document fields that a friendly name stands for; empty when it is none.
 std::vector<std::string> FriendlyFields(std::string_view name);
 
+/// The other way round: the first name that people write that stands for just these fields; of others the name of the
+/// first field itself. `fields` must not be empty.
+std::string NameOfFields(const std::vector<std::string>& fields);
+
 /// Whether the name is a document field's own.
 bool IsFullFieldName(std::string_view name);
 

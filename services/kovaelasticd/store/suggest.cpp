@@ -6,7 +6,7 @@
 #include <tuple>
 #include <utility>
 
-#include "services/kovaelasticd/store/edit_distance.h"
+#include "base/edit_distance.h"
 #include "services/kovaelasticd/store/fts.h"
 #include "services/kovaelasticd/store/store_rows.h"
 
@@ -42,7 +42,7 @@ std::vector<std::string> BestOf(std::vector<Known> candidates) {
 std::vector<std::string> SuggestWord(Database& database, const std::string& word) {
   if (word.size() < kShortestWord) return {};
   const size_t limit = LimitFor(word);
-  EditDistance distances(word, limit);
+  base::EditDistance distances(word, limit);
   std::vector<Known> candidates;
   Statement statement = database.Prepare("SELECT word, documents FROM suggestions WHERE word >= ?1 AND word < ?2");
   const std::string begin = word.substr(0, 1);  // the statement refers to these texts
@@ -70,7 +70,7 @@ class Vocabulary {
     std::map<std::string, Known> near;  // of both tables
     for (const char* next : {"SELECT term FROM temp.content_terms WHERE term >= ?1 LIMIT 1",
                              "SELECT term FROM temp.meta_terms WHERE term >= ?1 LIMIT 1"}) {
-      EditDistance distances(word, limit);
+      base::EditDistance distances(word, limit);
       for (std::string from(1, word.front()); !from.empty() && !IsExhausted();) {
         const std::string found = FirstFrom(next, from);
         if (found.empty() || found.front() != word.front()) break;
@@ -109,7 +109,7 @@ class Vocabulary {
   }
 
   /// How many bytes of `word` words within the limit may begin with; these are appended.
-  static size_t Follow(EditDistance& distances, const std::string& word) {
+  static size_t Follow(base::EditDistance& distances, const std::string& word) {
     distances.Cut(0);
     for (size_t i = 0; i < word.size(); ++i) {
       if (!distances.Append(word[i])) return i;
@@ -119,7 +119,7 @@ class Vocabulary {
 
   /// The first beginning behind all words that begin with `begin`, of which words within the limit may be; "" for none
   /// with the same first byte.
-  static std::string NextBeginning(EditDistance& distances, std::string begin) {
+  static std::string NextBeginning(base::EditDistance& distances, std::string begin) {
     for (; begin.size() > 1; begin.pop_back()) {
       for (int byte = static_cast<unsigned char>(begin.back()) + 1; byte <= 0xFF; ++byte) {
         distances.Cut(begin.size() - 1);

@@ -1,8 +1,8 @@
-#include "services/kovaelasticd/store/edit_distance.h"
+#include "base/edit_distance.h"
 
 #include <algorithm>
 
-namespace ferrox::engine {
+namespace base {
 
 EditDistance::EditDistance(std::string_view word, size_t limit) : word_(word), limit_(limit) {
   Row& row = rows_.emplace_back(Row{'\0', 0, std::vector<size_t>(word.size() + 1)});
@@ -40,4 +40,4 @@ size_t EditDistance::DistanceOf(std::string_view other) {
   return Distance();
 }
 
-}  // namespace ferrox::engine
+}  // namespace base

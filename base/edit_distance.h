@@ -4,7 +4,7 @@
 #include <string_view>
 #include <vector>
 
-namespace ferrox::engine {
+namespace base {
 
 /// How far words are from one word: the number of bytes to insert, remove, change or swap with the next one
 /// (Damerau-Levenshtein, computed row by row). Words are folded, so a byte is a letter in Latin script. The other word
@@ -34,4 +34,4 @@ class EditDistance {
   std::vector<Row> rows_;  ///< one more than bytes were appended
 };
 
-}  // namespace ferrox::engine
+}  // namespace base
