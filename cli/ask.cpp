@@ -6,6 +6,7 @@
 #include "cli/command.h"
 #include "cli/format.h"
 #include "cli/rights.h"
+#include "cli/web_client.h"
 #include "common/error.h"
 #include "common/paths.h"
 #include "wire/await_changes.h"
@@ -87,6 +88,13 @@ DaemonState StateFrom(const Daemon& daemon, wire::Reply reply) try {
 /// The engine has no command "status"; its answer to "ping" says the same.
 DaemonState EngineState() { return StateFrom(kEngine, wire::AskEngine(wire::EngineRequest("ping"), kStateWait)); }
 
+DaemonState WebState() {
+  const WebReply reply = AskWebDaemon("GET", "/api/v1/status", Json::Value(), kStateWait);
+  if (reply.outcome == WebReply::Outcome::kNotRunning) return {};
+  if (reply.outcome == WebReply::Outcome::kAnswered && reply.status == 200) return {reply.body, ""};
+  return {Json::Value(), kNoAnswer};
+}
+
 DaemonState StateOf(const Daemon& daemon) {
   return StateFrom(daemon, SendCommand(daemon, "status", Json::Value(), kStateWait));
 }
@@ -117,12 +125,14 @@ InstanceState AskAll() {
   auto notification_daemon = ask(kNotificationDaemon);
   auto content_extraction = ask(kContentExtraction);
   auto access_check = ask(kAccessCheck);
+  auto web = std::async(std::launch::async, &WebState);
   InstanceState state;
   state.engine = EngineState();
   state.index_daemon = index_daemon.get();
   state.notification_daemon = notification_daemon.get();
   state.content_extraction = content_extraction.get();
   state.access_check = access_check.get();
+  state.web = web.get();
   return state;
 }
 

@@ -38,6 +38,7 @@ struct InstanceState {
   DaemonState notification_daemon;
   DaemonState content_extraction;
   DaemonState access_check;
+  DaemonState web;
 };
 /// Asks all daemons at once and waits for each at most 5 s, so that one that hangs hides nothing of the others.
 /// @throws NotPermitted.

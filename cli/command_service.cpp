@@ -38,13 +38,14 @@ struct Service {
 constexpr char kAccess[] = "kova-access";
 
 /// In the order in which they start: the index daemon needs the engine and content extraction, and reads the queues
-/// that the notification daemon fills.
+/// that the notification daemon fills; all are there when others may ask over the network.
 constexpr Service kServices[] = {
     {"kovaelasticd", "search engine", &KLIBServiceStart, &KLIBServiceStop, 1},
     {kAccess, "access check", &KLIBServiceStart, &KLIBServiceStop, 1},
     {"kovacontentextractd", "content extraction", &KLIBServiceStart, &KLIBServiceStop, 1},
     {"kovanotifyd", "notification daemon", &KLIBServiceStart, &KLIBServiceStop, 1},
     {"pkg-Ferrox-fileindexd", "index daemon", &KLIBServicectlStart, &KLIBServicectlStop, KLIB_SERVICECTL_UPSTART},
+    {"kovawebd", "web daemon", &KLIBServiceStart, &KLIBServiceStop, 1},
 };
 
 constexpr Service kSupervisor = {"fileindex-supervisor", "supervisor", nullptr, nullptr, 0};

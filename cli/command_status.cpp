@@ -113,6 +113,15 @@ std::string AccessCheckText(const Json::Value& daemon) {
   return "runs, process " + std::to_string(IntOf(daemon, "pid")) + UnresponsiveText(daemon);
 }
 
+std::string WebText(const Json::Value& daemon) {
+  if (!daemon.isObject()) return kStopped;
+  std::string text = "runs, process " + std::to_string(IntOf(daemon, "pid"));
+  for (const Json::Value& address : daemon["addresses"]) {
+    if (address.isString()) text += ", " + EscapeForTerminal(address.asString());
+  }
+  return text;
+}
+
 /// Null where there is none, and systemd does its work.
 Json::Value SupervisorJson() {
   Json::Value json;
@@ -167,7 +176,7 @@ int ExitCodeOf(const Report& report) {
       report.has_folders && (report.IndexDaemon().isNull() || report.NotificationDaemon().isNull() || is_unchecked);
   if (is_stopped || report.state.engine.status.isNull()) return kFailure;
   for (const DaemonState* daemon : {&report.state.engine, &report.state.index_daemon, &report.state.notification_daemon,
-                                    &report.state.content_extraction, &report.state.access_check}) {
+                                    &report.state.content_extraction, &report.state.access_check, &report.state.web}) {
     if (!daemon->problem.empty()) return kFailure;
   }
   return kDone;
@@ -181,6 +190,7 @@ void PrintAsJson(const Report& report) {
   json["notification_daemon"] = StatusJson(report.state.notification_daemon);
   json["content_extraction"] = StatusJson(report.state.content_extraction);
   json["access_check"] = StatusJson(report.state.access_check);
+  json["web"] = StatusJson(report.state.web);
   json["supervisor"] = SupervisorJson();
   json["resting_shares"] = report.resting;
   const std::string& problem = report.folders_problem.empty() ? report.table_problem : report.folders_problem;
@@ -201,6 +211,7 @@ void PrintDaemons(const Report& report) {
   if (services::IsRootsInstance()) {
     PrintDaemon("access check", report.state.access_check, AccessCheckText(report.state.access_check.status));
   }
+  PrintDaemon("web daemon", report.state.web, WebText(report.state.web.status));
   PrintSupervisor();
 }
 

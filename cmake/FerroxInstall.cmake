@@ -44,16 +44,17 @@ install(FILES ${CMAKE_SOURCE_DIR}/packaging/completions/_fileindexctl
 
 # systemd looks for units, tmpfiles and sysusers below "lib", whatever the folder of the libraries is called. The units
 # name the programs with the prefix that is given when they are installed.
-set(units kovaelasticd kova-engine-user kova-access kovanotifyd kovacontentextractd fileindexd fileindex-prepare)
+set(units kovaelasticd.service kova-engine-user.service kova-access.service kovanotifyd.service kovacontentextractd.service
+    fileindexd.service fileindex-prepare.service kovawebd.service kovawebd.socket)
 install(CODE "
   set(bin_folder \${CMAKE_INSTALL_PREFIX}/${CMAKE_INSTALL_BINDIR})
   set(sbin_folder \${CMAKE_INSTALL_PREFIX}/${CMAKE_INSTALL_SBINDIR})
   set(sysusers_folder \${CMAKE_INSTALL_PREFIX}/lib/sysusers.d)
   foreach(unit ${units})
-    configure_file(${CMAKE_SOURCE_DIR}/packaging/systemd/\${unit}.service.in ${CMAKE_BINARY_DIR}/\${unit}.service @ONLY)
+    configure_file(${CMAKE_SOURCE_DIR}/packaging/systemd/\${unit}.in ${CMAKE_BINARY_DIR}/\${unit} @ONLY)
   endforeach()")
 foreach(unit ${units})
-  install(FILES ${CMAKE_BINARY_DIR}/${unit}.service DESTINATION lib/systemd/system)
+  install(FILES ${CMAKE_BINARY_DIR}/${unit} DESTINATION lib/systemd/system)
 endforeach()
 install(FILES ${CMAKE_SOURCE_DIR}/packaging/tmpfiles.d/libfileindex.conf DESTINATION lib/tmpfiles.d)
 install(FILES ${CMAKE_SOURCE_DIR}/packaging/sysusers.d/libfileindex.conf DESTINATION lib/sysusers.d)

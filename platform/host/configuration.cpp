@@ -32,10 +32,15 @@ bool ReadNotifyd(const Json::Value& object, Configuration::Notifyd& notifyd) {
          notifyd.scan_interval_sec >= kScanIntervalMinSec;
 }
 
+bool ReadWeb(const Json::Value& object, Configuration::Web& web) {
+  return object.isObject() && ReadMember(object, "addresses", web.addresses) && ReadMember(object, "hosts", web.hosts);
+}
+
 Configuration Load(const std::string& path) {
   Configuration configuration;
   configuration.samba.config = InstanceRoot() + "/etc/samba/smb.conf";
   if (InstanceRoot().empty()) configuration.samba.smbcontrol = "/usr/bin/smbcontrol";
+  configuration.web.addresses = {InstanceRoot().empty() ? "127.0.0.1:9280" : "127.0.0.1:0"};
   Json::Value value;
   configuration.problem = ReadJsonFile(path, value);
   if (!configuration.problem.empty() || value.isNull()) return configuration;
@@ -43,7 +48,8 @@ Configuration Load(const std::string& path) {
                     ReadMember(value, "trusted_clients", configuration.trusted_clients) &&
                     ReadMember(value, "least_user", configuration.least_user) &&
                     (!value.isMember("samba") || ReadSamba(value["samba"], configuration.samba)) &&
-                    (!value.isMember("notifyd") || ReadNotifyd(value["notifyd"], configuration.notifyd));
+                    (!value.isMember("notifyd") || ReadNotifyd(value["notifyd"], configuration.notifyd)) &&
+                    (!value.isMember("web") || ReadWeb(value["web"], configuration.web));
   if (!read) configuration.problem = "is not an object of settings, or one has the wrong type";
   return configuration;
 }

@@ -23,6 +23,11 @@ struct Configuration {
     std::vector<std::string> watch = {"fanotify", "fanotify inode marks", "inotify", "periodic scan"};
     uint32_t scan_interval_sec = 600;  ///< between the scans of what it cannot watch
   } notifyd = {};
+  struct Web {
+    /// Where the web daemon listens, "127.0.0.1:9280"; in an instance that is not the host's own, a free port.
+    std::vector<std::string> addresses;
+    std::vector<std::string> hosts = {"localhost"};  ///< names, beside its addresses, by which it may be asked
+  } web = {};
   /// Users whose programs may search for others, and the least uid that they may search for.
   std::vector<std::string> trusted_clients = {};
   uint32_t least_user = 1000;

@@ -20,6 +20,7 @@ constexpr ServiceRow kServices[] = {
     {"kovanotifyd", "kovanotifyd", "/var/run/kovanotifyd.sock", "kovanotifyd.service"},
     {"kova-access", "kova-access", "/var/run/kova-access.sock", "kova-access.service"},
     {"kovacontentextractd", "kovacontentextractd", "/var/run/kovacontentextractd.sock", "kovacontentextractd.service"},
+    {"kovawebd", "kovawebd", "/var/run/kovawebd/sock", "kovawebd.service"},
 };
 /// The file-sharing service is the host's own; an instance cannot switch it.
 constexpr ServiceRow kFileSharing = {"samba", nullptr, nullptr, "smbd.service"};

@@ -61,10 +61,11 @@ TrustedClients FindAccounts(const std::vector<std::string>& names) {
 
 }  // namespace
 
-TrustedClients GetTrustedClients() {
+TrustedClients GetTrustedClients(std::optional<uid_t> own_client) {
   const std::shared_ptr<const Configuration> settings = GetConfiguration();
-  const bool none = !settings->problem.empty() || settings->trusted_clients.empty();
+  const bool none = !settings->problem.empty() || (settings->trusted_clients.empty() && !own_client.has_value());
   TrustedClients clients = none ? TrustedClients() : FindAccounts(settings->trusted_clients);
+  if (!none && own_client.has_value()) clients.uids.push_back(*own_client);
   clients.least_user = settings->least_user;
   return clients;
 }

@@ -3,6 +3,7 @@
 #include <sys/types.h>
 
 #include <cstdint>
+#include <optional>
 #include <vector>
 
 namespace kova::host {
@@ -16,9 +17,10 @@ struct TrustedClients {
   std::vector<uid_t> ended = {};
 };
 
-/// Those of now: reads those files where the settings name any. They are accounts of that file: nobody on the network
+/// Those of now, and `own_client`, a daemon of the product's own, where there is one: reads those files where there are
+/// any. Those that the settings name are accounts of that file: nobody on the network
 /// is waited for, or can become one. A name without such an account is logged; settings with a mistake name nobody. Any
 /// thread may call.
-TrustedClients GetTrustedClients();
+TrustedClients GetTrustedClients(std::optional<uid_t> own_client);
 
 }  // namespace kova::host

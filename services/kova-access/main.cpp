@@ -3,6 +3,7 @@
 #include <cstdio>
 #include <cstring>
 #include <exception>
+#include <optional>
 #include <utility>
 
 #include <kova/log.h>
@@ -13,6 +14,7 @@
 #include "services/support/daemon.h"
 #include "services/support/engine_user.h"
 #include "services/support/frame_server.h"
+#include "services/support/web_user.h"
 
 namespace {
 
@@ -33,7 +35,9 @@ constexpr uint32_t kRequestMaxBytes = 8U << 20;
 constexpr unsigned kConnectionsMax = 64;
 
 wire::Trust ReadTrust() {
-  kova::host::TrustedClients clients = kova::host::GetTrustedClients();
+  const std::optional<services::EngineIds> web = services::WebUser();
+  kova::host::TrustedClients clients =
+      kova::host::GetTrustedClients(web.has_value() ? std::optional(web->uid) : std::nullopt);
   return {std::move(clients.uids), clients.least_user, std::move(clients.ended)};
 }
 

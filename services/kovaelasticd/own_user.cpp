@@ -1,17 +1,12 @@
 #include "services/kovaelasticd/own_user.h"
 
 #include <fcntl.h>
-#include <grp.h>
-#include <pwd.h>
-#include <sys/prctl.h>
 #include <sys/stat.h>
 #include <syslog.h>
 #include <unistd.h>
 
 #include <algorithm>
 #include <cerrno>
-#include <charconv>
-#include <climits>
 #include <cstdlib>
 #include <memory>
 #include <vector>
@@ -27,6 +22,7 @@
 #include "common/paths.h"
 #include "services/support/engine_user.h"
 #include "services/support/instance_owner.h"
+#include "services/support/own_account.h"
 #include "wire/frame_client.h"
 
 namespace ferrox::engine {
@@ -36,21 +32,6 @@ namespace {
 using services::EngineIds;
 
 constexpr char kIndexFolder[] = "/var/lib/kova/fileindex/db";
-
-EngineIds IdsOf(const std::string& user) {
-  EngineIds ids;
-  const char* end = user.data() + user.size();
-  const passwd* account = getpwnam(user.c_str());
-  if (account != nullptr) {
-    ids = {account->pw_uid, account->pw_gid};
-  } else if (const auto read = std::from_chars(user.data(), end, ids.uid); read.ec == std::errc() && read.ptr == end) {
-    account = getpwuid(ids.uid);
-    ids.gid = account != nullptr ? account->pw_gid : ids.uid;
-  }
-  const bool usable = ids.uid != 0 && ids.gid != 0 && ids.uid != UINT_MAX;
-  FERROX_FAIL_IF(!usable, Error::kInternal, "\"" + user + "\" is no account that the engine can have");
-  return ids;
-}
 
 /// A folder that only root can change, opened from "/" on without following a link; invalid when there is none.
 base::UniqueFd OpenRootsFolder(const std::string& path, bool is_real = false) {
@@ -153,22 +134,6 @@ void GiveOtherIndices(const EngineIds& to) {
   }
 }
 
-/// In a folder where the user can make no file; one of an engine of root's serves as well.
-bool MakePidFile(const EngineIds& to) {
-  const std::string path = InstancePath("/var/run/kovaelasticd.pid");
-  const base::UniqueFd file(open(path.c_str(), O_RDWR | O_CREAT | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC, 0600));
-  struct stat status = {};
-  return file.Valid() && fstat(file.Get(), &status) == 0 && S_ISREG(status.st_mode) && status.st_nlink == 1 &&
-         fchown(file.Get(), to.uid, to.gid) == 0 && fchmod(file.Get(), 0600) == 0;
-}
-
-bool MakeRunFolder(const EngineIds& to) {
-  const std::string path = InstancePath(kElasticdRunFolder);
-  if (mkdir(path.c_str(), 0755) != 0 && errno != EEXIST) return false;
-  const base::UniqueFd folder(open(path.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
-  return folder.Valid() && fchown(folder.Get(), to.uid, to.gid) == 0 && fchmod(folder.Get(), 0755) == 0;
-}
-
 /// The link stands where an engine of root's has its socket, so that clients need not know.
 bool MakeSocketLink() {
   const std::string path = InstancePath(kElasticdSocket);
@@ -206,7 +171,9 @@ void Prepare(const EngineIds& to) {
                  "only root can give the engine a user of its own, and in an instance of root's");
   const std::optional<EngineIds> known = services::EngineUser();
   services::ClosePrivateFolders();
-  const bool made = MakeFoldersForUser() && MakeSocketLink() && MakeRunFolder(to) && MakePidFile(to);
+  const bool made = MakeFoldersForUser() && MakeSocketLink() &&
+                    services::GiveOwnFolder(InstancePath(kElasticdRunFolder), 0755, to) &&
+                    services::GivePidFile("kovaelasticd", to);
   FERROX_FAIL_IF(!made, Error::kInternal, "the folders of the engine's user cannot be made: " + ErrnoText());
   const bool given = GiveIndices(to);
   FERROX_FAIL_IF(!given, Error::kInternal,
@@ -226,16 +193,13 @@ void Prepare(const EngineIds& to) {
 
 }  // namespace
 
-void PrepareForUser(const std::string& user) { Prepare(IdsOf(user)); }
+void PrepareForUser(const std::string& user) { Prepare(services::IdsOfAccount(user, "the engine")); }
 
 void BecomeOwnUser() {
   const std::optional<EngineIds> own = services::EngineUser();
   if (geteuid() != 0 || !own.has_value()) return;
   Prepare(*own);
-  const bool became = setgroups(0, nullptr) == 0 && setresgid(own->gid, own->gid, own->gid) == 0 &&
-                      setresuid(own->uid, own->uid, own->uid) == 0 && setresuid(0, 0, 0) != 0;
-  FERROX_FAIL_IF(!became, Error::kInternal, "cannot become user " + std::to_string(own->uid));
-  (void)prctl(PR_SET_DUMPABLE, 1);  // its files below /proc are its own, as if that user had started it
+  services::BecomeUser(*own);
 }
 
 std::string OwnSocketPath() {

@@ -49,16 +49,18 @@ bool IsRootsAlone(const char* folder) {
 
 bool MayOthersWrite(const struct stat& status) { return (status.st_mode & 022) != 0; }
 
-std::optional<EngineIds> EngineUser() {
+std::optional<EngineIds> UserOfFolder(const char* folder) {
   if (!IsRootsInstance()) return {};
-  for (const char* folder : {"/var", "/var/lib", "/var/lib/kova"}) {
-    if (!IsRootsAlone(folder)) return {};
+  for (const char* above : {"/var", "/var/lib", "/var/lib/kova"}) {
+    if (!IsRootsAlone(above)) return {};
   }
   struct stat status = {};
-  const bool is_own = lstat(InstancePath(kElasticdFolder).c_str(), &status) == 0 && S_ISDIR(status.st_mode) &&
+  const bool is_own = lstat(InstancePath(folder).c_str(), &status) == 0 && S_ISDIR(status.st_mode) &&
                       status.st_uid != 0 && (status.st_mode & 077) == 0;
   return is_own ? std::optional(EngineIds{status.st_uid, status.st_gid}) : std::nullopt;
 }
+
+std::optional<EngineIds> EngineUser() { return UserOfFolder(kElasticdFolder); }
 
 void AdmitEngine(const std::string& path) {
   const std::optional<EngineIds> engine = EngineUser();

@@ -18,6 +18,10 @@ struct EngineIds {
   gid_t gid = 0;
 };
 
+/// The owner of a folder in /var/lib/kova that only root can have given away. Nothing where it is root's, where the
+/// instance is not root's, where others than root could have put another folder there, and where others may enter it.
+std::optional<EngineIds> UserOfFolder(const char* folder);
+
 /// The engine's own user. Nothing where the engine is root's, where the instance is not root's, and where others than
 /// root could have put another folder there.
 std::optional<EngineIds> EngineUser();

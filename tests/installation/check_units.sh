@@ -9,20 +9,21 @@ trap 'FERROX_ROOT=$work/root "$bin/fileindexctl" down >/dev/null || true; rm -rf
 command -v systemd-analyze >/dev/null || { echo "skipped: there is no systemd-analyze"; exit 77; }
 
 fail() { echo "$*"; exit 1; }
-engine=50009
-daemons=(kovaelasticd kova-access fileindexd kovanotifyd kovacontentextractd)
+engine=50009 web=50008
+daemons=(kovaelasticd kova-access fileindexd kovanotifyd kovacontentextractd kovawebd)
 mkdir "$work/libexec" "$work/units"
 ln -s "$bin"/* "$work/libexec"
 for daemon in "${daemons[@]}"; do
   unit=$work/units/$daemon.service
   sed 's,@sbin_folder@/.*,/bin/true,' "$units/$daemon.service.in" >"$unit"
-  case $daemon in kovaelasticd) worst=10 ;; kova-access) worst=20 ;; *) worst=40 ;; esac
+  case $daemon in kovaelasticd) worst=10 ;; kova-access) worst=20 ;; kovawebd) worst=15 ;; *) worst=40 ;; esac
   systemd-analyze security --offline=true --threshold=$worst --no-pager "$unit" >"$work/judgement" 2>&1 ||
     fail "$daemon is judged worse than $((worst / 10)).0: $(cat "$work/judgement")"
   grep -qx "StartLimitIntervalSec=0" "$unit" || fail "$daemon is given up after a few ends"
   capabilities=$(sed -n 's/^CapabilityBoundingSet=//p' "$unit" | tr 'A-Z ' 'a-z,' | sed 's/cap_/+/g')
   rm "$work/libexec/$daemon"
   ids= && grep -q '^User=kova-engine$' "$unit" && ids="--reuid $engine --regid $engine --clear-groups"
+  grep -q '^User=kova-web$' "$unit" && ids="--reuid $web --regid $web --clear-groups"
   printf '#!/bin/sh\nexec setpriv %s --no-new-privs --bounding-set=-all%s --inh-caps=-all %s\n' "$ids" \
     "${capabilities:+,$capabilities}" "$bin/$daemon" >"$work/libexec/$daemon"
   chmod +x "$work/libexec/$daemon"
@@ -41,6 +42,7 @@ chmod 0700 "$share"
 finds lantern
 "$bin/fileindexctl" down >/dev/null
 "$bin/kovaelasticd" --prepare $engine
+"$bin/kovawebd" --prepare $web
 chmod 755 "$work"
 export FERROX_LIBEXEC=$work/libexec
 "$bin/fileindexctl" up --no-supervisor >/dev/null

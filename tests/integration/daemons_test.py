@@ -220,7 +220,8 @@ class DaemonsTest(InstanceTestCase):
 
     def status_of(self, program):
         """The process that the daemon says it is."""
-        names = {"kovaelasticd": "engine", "kova-access": "access_check", "fileindexd": "index_daemon", "kovanotifyd": "notification_daemon"}
+        names = {"kovaelasticd": "engine", "kova-access": "access_check", "fileindexd": "index_daemon", "kovanotifyd": "notification_daemon",
+                 "kovawebd": "web"}
         state = self.instance.status().get(names.get(program, "content_extraction"))
         return state and state.get("pid")
 

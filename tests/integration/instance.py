@@ -15,7 +15,7 @@ import unittest
 BIN = os.environ.get("FERROX_BIN", "")
 TIMEOUT = 120
 # Only an instance of root's checks what users may open.
-DAEMONS = ("kovaelasticd", *(["kova-access"] if os.geteuid() == 0 else []), "kovacontentextractd", "kovanotifyd", "fileindexd")
+DAEMONS = ("kovaelasticd", *(["kova-access"] if os.geteuid() == 0 else []), "kovacontentextractd", "kovanotifyd", "fileindexd", "kovawebd")
 
 CREATE, MODIFY, DELETE, RENAME = 0x40, 0x2, 0x80, 0x100
 

@@ -27,7 +27,7 @@ MAY = {
     "services/support": LIBRARY,
     "cli": LIBRARY + ["services/support"],
 }
-DAEMONS = ("fileindexd", "kova-access", "kova-accounts", "kovacontentextractd", "kovaelasticd", "kovanotifyd", "supervisor")
+DAEMONS = ("fileindexd", "kova-access", "kova-accounts", "kovacontentextractd", "kovaelasticd", "kovanotifyd", "kovawebd", "supervisor")
 MAY |= {f"services/{name}": LIBRARY + ["services/support"] for name in DAEMONS}
 # The engine's rooms, each of which may include those before it.
 ENGINE = [f"services/kovaelasticd/{name}" for name in ("text", "query", "store", "search", "indices", "commands")]
@@ -50,6 +50,7 @@ EXCEPTIONS = {
     "services/kovaelasticd/main.cpp": ["platform/host/account_lookup.h"],
     "services/kova-access/main.cpp": ["platform/host/trusted_clients.h"],
     "services/kovanotifyd/main.cpp": ["platform/host/configuration.h", "platform/host/notify_registry.h"],
+    "services/kovawebd/main.cpp": ["platform/host/configuration.h"],
     "services/supervisor/main.cpp": ["platform/host/service_log.h", "platform/host/child_service.h"],
 }
 # The tool keeps the table of shares, tells what is wrong in it or why a service did not start, and knows mount points.
