@@ -161,10 +161,15 @@ class Instance:
                 return
 
     def wait_idle(self, share, folder):
+        def holds_lines(path):
+            try:
+                return os.path.getsize(path) > 0
+            except FileNotFoundError:
+                return False
+
         def idle():
-            state = self.share_status(share)
-            files = [self.queue_path(folder), self.queue_path(folder) + ".tmp"]
-            return state["state"] == "idle" and not any(os.path.exists(f) and os.path.getsize(f) for f in files)
+            states = [s["state"] for s in self.status()["index_daemon"]["shares"] if s["share"] == share]
+            return states == ["idle"] and not any(map(holds_lines, (self.queue_path(folder), self.queue_path(folder) + ".tmp")))
         wait_for(idle, f"share {share} to be idle")
 
 

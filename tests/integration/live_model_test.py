@@ -285,7 +285,7 @@ class World:
         self.continue_reader()
         self.instance.ctl("up")
         self.note("sync")
-        problems = self.instance.sync()
+        problems = self.instance.sync(may_lack=True)
         found = self.instance.differences()
         if not found:
             self.linked.clear()
