@@ -10,6 +10,7 @@
 #include "services/kovawebd/host_rules.h"
 #include "services/kovawebd/openapi.h"
 #include "services/kovawebd/query_string.h"
+#include "services/kovawebd/routes.h"
 
 namespace ferrox::web {
 
@@ -29,26 +30,24 @@ std::string AsUtf8(std::string_view text) {
 
 }  // namespace
 
-Service::Service(Options options)
-    : options_(std::move(options)),
-      routes_({
-          {"GET",
-           "/api/v1/status",
-           "status",
-           "That the daemon answers, where, and whether the search engine does.",
-           Route::For::kUser,
-           {},
-           {},
-           [this](const Call& call) { return Status(call); }},
-          {"GET",
-           "/api/v1/openapi.json",
-           "openapi",
-           "This description.",
-           Route::For::kAnyone,
-           {},
-           {},
-           [this](const Call&) { return DescribeApi(routes_, FERROX_VERSION); }},
-      }) {}
+Service::Service(Options options) : options_(std::move(options)), routes_(MakeRoutes()) {}
+
+std::vector<Route> Service::MakeRoutes() const {
+  std::vector<Route> routes = SearchRoutes();
+  routes.push_back({"GET",
+                    "/api/v1/status",
+                    "status",
+                    "That the daemon answers, where, and whether the search engine does.",
+                    Route::For::kUser,
+                    {},
+                    {},
+                    [this](const Call& call) { return Status(call); }});
+  routes.push_back(
+      {"GET", "/api/v1/openapi.json", "openapi", "This description.", Route::For::kAnyone, {}, {}, [this](const Call&) {
+         return DescribeApi(routes_, FERROX_VERSION);
+       }});
+  return routes;
+}
 
 /// @throws Problem 401, 403.
 Who Service::Identify(const Request& request, const Route& route) const {

@@ -28,6 +28,7 @@ class Service {
   const std::vector<Route>& Routes() const { return routes_; }
 
  private:
+  std::vector<Route> MakeRoutes() const;
   Who Identify(const Request& request, const Route& route) const;
   Json::Value Status(const Call& call) const;
 

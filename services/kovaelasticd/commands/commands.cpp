@@ -34,7 +34,7 @@ constexpr Command kOtherCommands[] = {{"access_set", &RunAccessSet, Users::kPriv
                                       {"search", &RunSearch, Users::kEveryoneAndFor},
                                       {"complete", &RunComplete, Users::kEveryoneAndFor},
                                       {"show", &RunShow, Users::kEveryoneAndFor},
-                                      {"fresh", &RunFresh, Users::kEveryone},
+                                      {"fresh", &RunFresh, Users::kEveryoneAndFor},
                                       {"shares", &RunShares, Users::kEveryoneAndFor},
                                       {"ping", &OnPing, Users::kEveryone}};
 
