@@ -7,4 +7,8 @@ namespace base {
 /// it, which changes nothing but the speed of others.
 bool YieldToOthers();
 
+/// The same at the processor alone, for work that somebody waits for, but that others go before: beside one other
+/// thread on the same processor it still has about a tenth of that.
+bool StandBehindOthers();
+
 }  // namespace base

@@ -3,8 +3,9 @@
 
 One process of user 50001 keeps --connections connections open to the engine, each with one of the costliest queries, and
 sends the next one, or connects again, as soon as it is answered, refused or thrown out. Meanwhile user 50002 and root ask
-the same --samples ordinary queries, one after the other on a connection each, as they did before the flood. Printed are the
-median and the 99th percentile of each, and what became of the flood's requests.
+--samples ordinary queries, one after the other on a connection each; root also on a new connection each. That is done
+--rounds times in turn with the flood stopped and let go on, so that what else the machine does is in both. Printed are the
+medians and the 99th percentiles of all rounds, and what became of the flood's requests.
 
 Needs: root, a build (--build). On a machine that is busy otherwise, its work is in the times, too; so is the flood's own.
 """
@@ -49,12 +50,15 @@ def percentile(values, part):
     return sorted(values)[min(len(values) - 1, int(len(values) * part))]
 
 
-def times_of(asking, instance, samples):
+def times_of(asking, instance, samples, connects):
     rng, times = random.Random(2), []
     engine = instance.connect()
     for _ in range(samples):
         body = asking.request("search", usual(rng))
         begin = time.monotonic()
+        if connects:
+            engine.close()
+            engine = instance.connect()
         reply = asking.parse(engine.ask_bytes(body))
         times.append(time.monotonic() - begin)
         assert reply["success"], reply
@@ -107,18 +111,32 @@ def send_next(asking, engine, rng):
     return True
 
 
-def measure(asking, instance, samples, name):
-    for who, user in (("another user", asking.User(VICTIM_UID, [VICTIM_UID])), ("root", None)):
-        times = asking.Child(user, lambda: times_of(asking, instance, samples)).result() if user else times_of(
-            asking, instance, samples)
-        print(f"{name:16} {who:13} p50 {percentile(times, 0.5) * 1000:7.1f} ms  p99 {percentile(times, 0.99) * 1000:7.1f} ms  "
-              f"slowest {max(times) * 1000:7.1f} ms", flush=True)
+def measure(asking, instance, samples):
+    """The times of each who asks, in one round."""
+    def ask(connects=False):
+        return times_of(asking, instance, samples, connects)
+    return {"another user": asking.Child(asking.User(VICTIM_UID, [VICTIM_UID]), ask).result(), "root": ask(),
+            "root, connecting": ask(True)}
+
+
+def measure_in_turn(asking, instance, options, attacker):
+    """The times of each who asks, without and with the flood."""
+    times = collections.defaultdict(list)
+    for _ in range(options.rounds):
+        for name, do, settle in (("alone", signal.SIGSTOP, 3), ("with the flood", signal.SIGCONT, 1)):
+            os.kill(attacker, do)
+            time.sleep(settle)  # what the engine works on ends within its 2 s
+            for who, taken in measure(asking, instance, options.samples).items():
+                times[name, who] += taken
+    for (name, who), taken in times.items():
+        print(f"{name:16} {who:17} p50 {percentile(taken, 0.5) * 1000:7.1f} ms  p99 {percentile(taken, 0.99) * 1000:7.1f} ms  "
+              f"slowest {max(taken) * 1000:7.1f} ms", flush=True)
 
 
 def main():
     parser = argparse.ArgumentParser(description=__doc__, formatter_class=argparse.RawDescriptionHelpFormatter)
     parser.add_argument("--build", default=os.path.join(BENCH, "..", "build", "release"))
-    for name, default in (("files", 20000), ("connections", 200), ("samples", 500)):
+    for name, default in (("files", 20000), ("connections", 200), ("samples", 200), ("rounds", 5)):
         parser.add_argument("--" + name, type=int, default=default)
     options = parser.parse_args()
     os.environ["FERROX_BIN"] = os.path.realpath(os.path.join(options.build, "bin"))
@@ -130,13 +148,11 @@ def main():
         instance.share("docs")
         instance.sync()
         os.chmod(f"{instance.root}/var/run/kovaelasticd.sock", 0o666)
-        measure(asking, instance, options.samples, "alone")
         begun, ready = os.pipe()
         attack = asking.Child(asking.User(FLOOD_UID, [FLOOD_UID]),
                               lambda: flood(asking, instance, options.connections, [ready]))
         os.read(begun, 1)
-        time.sleep(1)
-        measure(asking, instance, options.samples, "with the flood")
+        measure_in_turn(asking, instance, options, attack.pid)
         os.kill(attack.pid, signal.SIGTERM)
         print("the flood:", ", ".join(f"{what} {count}" for what, count in attack.result().items()))
     finally:

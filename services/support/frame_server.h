@@ -32,8 +32,9 @@ struct FrameReply {
   base::UniqueFd descriptor;
 };
 
-/// What each of those who are bound may use of a server. All of them together have at most half of its connections and
-/// half of its workers, so that the others always find some.
+/// What each of those who are bound may use of a server. All of them together have connections and workers of their
+/// own, half as many as the others have; these workers stand behind all others at the processor (base/priority.h), and
+/// a connection is made by a thread that does. So the others find the server as free as without them.
 struct UserLimits {
   /// Whether a peer is bound; null: nobody is.
   std::function<bool(const Peer& peer)> is_bound = nullptr;

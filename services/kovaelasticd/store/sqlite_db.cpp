@@ -46,6 +46,10 @@ std::string Remedy(int result) {
   }
 }
 
+/// Before the first connection. The library's count of its memory, which nobody asks for, has a lock that each
+/// allocation of every thread takes: threads that others go before would keep these waiting.
+bool ConfigureLibrary() { return sqlite3_config(SQLITE_CONFIG_MEMSTATUS, 0) == SQLITE_OK; }
+
 }  // namespace
 
 Statement::~Statement() {
@@ -110,6 +114,8 @@ std::string_view Statement::Text(int column) const {
 }
 
 Database::Database(const std::string& path, Mode mode) : path_(path) {
+  static const bool configured = ConfigureLibrary();
+  (void)configured;  // where something else in the process uses the library already, it stays as it is
   int flags = SQLITE_OPEN_NOMUTEX | SQLITE_OPEN_EXRESCODE;
   // Readers write too: the wal-index, and recovery after a crash.
   flags |= mode == Mode::kCreate ? SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE : SQLITE_OPEN_READWRITE;
