@@ -66,7 +66,8 @@ AskedUser ReadAskedUser(const std::string& text) {
     user.groups = GroupsOf(user, group);
   } else {
     const std::optional<uint32_t> uid = IdOf(text.substr(0, colon));
-    if (!uid.has_value()) throw UsageError("there is no user \"" + text + "\"");
+    if (!uid.has_value())
+      throw UsageError("there is no user \"" + text + "\"; give an account, or numbers as in 5001:100,200");
     if (colon == std::string::npos) {
       throw UsageError("there is no user " + text + "; give the groups' numbers as well, as in " + text + ":100,200");
     }
@@ -74,7 +75,7 @@ AskedUser ReadAskedUser(const std::string& text) {
     user.uid = *uid;
     for (const std::string& part : Split(text.substr(colon + 1), ',')) {
       const std::optional<uint32_t> id = IdOf(part);
-      if (!id.has_value()) throw UsageError("\"" + part + "\" is no number of a group");
+      if (!id.has_value()) throw UsageError("\"" + part + "\" is not the number of a group");
       user.groups.push_back(*id);
     }
   }

@@ -51,7 +51,8 @@ Json::Value DataOf(const Daemon& daemon, wire::Reply reply) {
       return std::move(reply.data);
     case Outcome::kNotRunning:
       throw Failure(name + " does not run here (nothing answers at " + InstancePath(daemon.socket) + "); " +
-                    (IsPrivileged() ? "start it" : "its administrator starts it") + " with 'fileindexctl up'" + code);
+                    (IsPrivileged() ? "start it" : "its administrator can start it") + " with 'fileindexctl up'" +
+                    code);
     case Outcome::kNotPermitted:
       throw MayNotConnect(InstancePath(daemon.socket));
     case Outcome::kNoAnswer:
@@ -140,7 +141,7 @@ InstanceState AskAll() {
 std::string NotNoticed() {
   for (const Daemon& daemon : {kNotificationDaemon, kIndexDaemon}) {
     if (wire::IsServed(InstancePath(daemon.socket))) continue;
-    return std::string(daemon.name) + " does not run, so that what has changed since may be missing; start it with " +
+    return std::string(daemon.name) + " does not run, so recent changes may be missing; start it with " +
            "'fileindexctl up'";
   }
   return {};

@@ -2,11 +2,13 @@
 
 #include <algorithm>
 #include <cstdio>
+#include <map>
 #include <memory>
 #include <optional>
 
 #include <json/value.h>
 
+#include "base/path.h"
 #include "cli/ask.h"
 #include "cli/command_table.h"
 #include "cli/configuration_change.h"
@@ -16,12 +18,14 @@
 #include "cli/format.h"
 #include "cli/kinds.h"
 #include "cli/output.h"
+#include "cli/preview.h"
 #include "cli/rights.h"
 #include "common/file_util.h"
 #include "common/paths.h"
 #include "fileindex/folders/folder_mgr.h"
 #include "fileindex/operations/index_mgr.h"
 #include "fileindex/util.h"
+#include "sdk/share.h"
 
 /// The list of indexed folders: adding, changing, deleting and showing its entries. The library does it; here paths are
 /// understood as people give them, entries that are there already keep what is not changed, and failures are explained.
@@ -49,7 +53,7 @@ Json::Value ToArray(const std::vector<std::string>& paths) {
 /// The stored form of each folder: what is given, and of an entry that is there already the rest.
 Json::Value FolderEntries(const Arguments& arguments, const std::vector<std::string>& paths, const Kinds& kinds,
                           const FolderMgr& configured) {
-  if (arguments.Has("--name") && paths.size() != 1) throw UsageError("--name goes with one folder");
+  if (arguments.Has("--name") && paths.size() != 1) throw UsageError("--name goes with one folder at a time");
   Json::Value list(Json::arrayValue);
   for (const std::string& path : paths) {
     const std::string name = arguments.Get("--name", Basename(path));
@@ -75,6 +79,38 @@ void RequireNoFiles(const std::vector<std::string>& paths) {
   }
 }
 
+/// The library refuses the same, in fewer words.
+void RequireNew(const std::vector<std::string>& paths, const FolderMgr& configured) {
+  for (const std::string& path : paths) {
+    if (!configured.HasFolder(path)) continue;
+    throw Failure(path + " is indexed already; 'fileindexctl folder set' changes its kinds (error " +
+                  std::to_string(Error::kDuplicatedFolder) + ")");
+  }
+}
+
+/// What the library would refuse is refused here, too. Folders that are indexed already keep their own kinds.
+int PreviewFolders(const Arguments& arguments, const Kinds& kinds) {
+  const FolderMgr configured;
+  const std::vector<std::string> paths = SharePaths(arguments, configured);
+  RequireNoFiles(paths);
+  for (const std::string& path : paths) {
+    if (!fileindex::CanPathBeIndexed(path)) throw Failure(path + " cannot be indexed: " + WhyNotIndexable(path));
+    const std::string full_path = fileindex::GetFullPath(path);
+    std::map<std::string, std::string> others;
+    for (const auto& folder : configured.GetFolders()) {
+      if (base::IsBelow(folder->GetPath(), path)) others[folder->GetFullPath()] = "it is indexed already";
+    }
+    ShowPreview(path, sdk::SDKShare(fileindex::GetShareNameByPath(path)).GetPath(), full_path, kinds, std::move(others),
+                arguments.Has("--json"));
+    if (configured.IsFullPathIndexed(full_path)) {
+      (void)fprintf(stderr, "%s lies in a folder that is indexed already: at most its kinds would change\n",
+                    EscapeForTerminal(path).c_str());
+    }
+  }
+  if (!arguments.Has("--json")) (void)printf("nothing was changed\n");
+  return kDone;
+}
+
 /// Adds or changes folders with one call of the library, so that all of them are changed or none. The engine is asked
 /// first, since the index of a new share is made before the folders file is saved.
 int Upsert(const Arguments& arguments, const Kinds& kinds, void (*upsert)(const Json::Value&, bool)) {
@@ -87,7 +123,7 @@ int Upsert(const Arguments& arguments, const Kinds& kinds, void (*upsert)(const 
   for (const std::string& path : paths) {
     (void)printf("%s: %s\n", EscapeForTerminal(path).c_str(), kinds.Text().c_str());
   }
-  (void)printf("the index follows; 'fileindexctl status' shows how far it is\n");
+  (void)printf("indexing has begun; 'fileindexctl status' shows how far it is\n");
   return kDone;
 }
 
@@ -126,7 +162,7 @@ bool AddStates(Json::Value& folders, const Json::Value& with_states) {
     } catch (const Error& error) {
       reason = Explain(error);
     }
-    Warn(path + ": its state cannot be told: " + reason);
+    Warn(path + ": its state is not known: " + reason);
   }
   return next == folders.size();
 }
@@ -135,7 +171,10 @@ bool AddStates(Json::Value& folders, const Json::Value& with_states) {
 
 /// Refused for a folder that is in the list already (kDuplicatedFolder); the remedy names "folder set".
 int RunFolderAdd(const Arguments& arguments) {
-  return Upsert(arguments, Kinds(arguments.Get("--kinds", "all")), &fileindex::FolderAdd);
+  const Kinds kinds(arguments.Get("--kinds", "all"));
+  const FolderMgr configured;
+  RequireNew(SharePaths(arguments, configured), configured);
+  return IsDryRun(arguments) ? PreviewFolders(arguments, kinds) : Upsert(arguments, kinds, &fileindex::FolderAdd);
 }
 
 /// A change without --kinds would switch all kinds on, which is hardly meant: it is an option that is needed.
@@ -150,7 +189,7 @@ int RunFolderDelete(const Arguments& arguments) {
   RequireIndexDaemon();
   ChangeConfiguration([&] { fileindex::FolderDelete(ToArray(paths)); });
   for (const std::string& path : paths) {
-    (void)printf("%s is no longer indexed; its files are as they were\n", EscapeForTerminal(path).c_str());
+    (void)printf("%s is no longer indexed; its files were not touched\n", EscapeForTerminal(path).c_str());
   }
   if (FolderMgr().GetFolders().empty()) (void)printf("no indexed folder is left: indexing has stopped\n");
   return kDone;
@@ -167,7 +206,7 @@ int RunFolderReindex(const Arguments& arguments) {
   fileindex::FolderReindex(ToArray(paths));
   for (const std::string& path : paths) (void)MarkIfBusy(fileindex::GetShareNameByPath(path));
   for (const std::string& path : paths) {
-    (void)printf("queued: %s will be compared with its index\n", EscapeForTerminal(path).c_str());
+    (void)printf("queued: %s will be compared with the index\n", EscapeForTerminal(path).c_str());
   }
   return kDone;
 }

@@ -80,15 +80,17 @@ bool ReindexIsPending(const Share& share, const Json::Value& status) {
 
 /// Why the index daemon has no entry of the share.
 [[noreturn]] void ThrowNotWorkedOn(const std::string& share) {
-  if (IsPaused(share)) throw Failure("share " + share + " is paused; 'fileindexctl share resume' goes on with it");
-  throw Failure("the index daemon does not index " + share + "; 'fileindexctl down' and 'up' make it look again");
+  if (IsPaused(share))
+    throw Failure("share " + share + " is paused; 'fileindexctl share resume " + share + "' resumes it");
+  throw Failure("the index daemon does not work on share " + share +
+                "; restart it with 'fileindexctl down' and 'fileindexctl up");
 }
 
 /// A pause of everything: no use to wait for its end.
 [[noreturn]] void ThrowPaused(const std::string& share) {
   const long long until = fileindex::StatusMgr().GetPauseInfo();
   throw Failure("indexing is paused" + (until > 0 ? " until " + Date(until) : "") + "; share " + share +
-                " is compared when it goes on, which 'fileindexctl resume' makes it do");
+                " is compared afterwards, or now if you run 'fileindexctl resume'");
 }
 
 /// Returns the share's last status.
@@ -155,7 +157,7 @@ int RunRebuild(const Arguments& arguments) {
   }
   if (arguments.Has("--wait")) return ReindexAndWait(share);
   QueueReindex(share);
-  (void)printf("begun: the index of share %s is made anew; 'fileindexctl status' shows how far it is\n",
+  (void)printf("started: the index of share %s is built again; 'fileindexctl status' shows how far it is\n",
                EscapeForTerminal(share.name).c_str());
   return kDone;
 }
@@ -164,7 +166,8 @@ int RunRebuild(const Arguments& arguments) {
 int RunSuggestRefresh(const Arguments& arguments) {
   const std::vector<std::string> shares = IndexedShares(arguments.words);
   if (shares.empty()) {
-    (void)fprintf(stderr, "no folder is indexed: there is nothing to suggest\n");
+    (void)fprintf(stderr,
+                  "no folder is indexed, so there is nothing to suggest; 'fileindexctl folder add' indexes one\n");
     return kNothingFound;
   }
   RequireEngine();
@@ -174,7 +177,7 @@ int RunSuggestRefresh(const Arguments& arguments) {
     const std::string database = sdk::SDKShare(share).GetDBName();
     if (left_out.Unless(share, [&] { fileindex::UpdateTermSuggestion({database}); })) ++done;
   }
-  (void)printf("suggestions of %s shares are new\n", Count(done).c_str());
+  (void)printf("suggestions updated for %s shares\n", Count(done).c_str());
   left_out.Warn();
   return left_out.Empty() ? kDone : kIncomplete;
 }

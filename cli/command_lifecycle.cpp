@@ -39,7 +39,7 @@ int CompareHomes(const std::function<void()>& tell, const std::function<int(KLIB
   KLIBCSzList* list = KLIBCSzListAlloc(1024);
   const int bins = enumerate(&list);
   KLIBCSzListFree(list);
-  if (bins < 0) throw Failure("the users' home folders cannot be read; see that the folder of share homes is there");
+  if (bins < 0) throw Failure("the users' home folders cannot be read; check that the folder of share homes exists");
   const bool indexed = FolderMgr().IsShareIndexed(kHomes);
   if (bins > 0 && indexed) tell();
   if (!indexed) {
@@ -47,7 +47,7 @@ int CompareHomes(const std::function<void()>& tell, const std::function<int(KLIB
   } else if (bins == 0) {
     (void)printf("nothing is compared: no home has a recycle bin\n");
   } else {
-    (void)printf("the recycle bins of the homes are compared with the index again: %d\n", bins);
+    (void)printf("%d recycle bins of homes will be compared with the index\n", bins);
   }
   return kDone;
 }
@@ -77,7 +77,7 @@ void RefuseActive(const std::string& share) {
   for (const auto& folder : configured.GetFolders()) {
     if (folder->GetShare() == share && !folder->IsPaused()) {
       throw Failure(folder->GetPath() + " is not paused; 'fileindexctl share pause " + share +
-                    "' first, or 'fileindexctl folder delete' to end its indexing");
+                    "' first, or 'fileindexctl folder delete' to stop indexing it");
     }
   }
 }
@@ -123,7 +123,8 @@ int RunShareForget(const Arguments& arguments) {
   const std::string queue = QueueOf(path);
   const bool has_remains = FolderMgr().IsShareIndexed(name) || HasIndex(name) || Exists(queue) ||
                            Exists(fileindex::DetachedQueuePath(queue));
-  if (!known && !has_remains) throw Failure("nothing is left of a share " + name + " at " + path + "; check both");
+  if (!known && !has_remains)
+    throw Failure("nothing is left of a share " + name + " at " + path + "; check the name and the folder");
   const int code =
       ChangeAndReport([&] { fileindex::ShareClearPaused(name, path); }, "share " + name + " had no indexed folder");
   fileindex::RemoveQueueFiles(queue);
@@ -135,7 +136,7 @@ int RunShareForget(const Arguments& arguments) {
 int RunShareCheckRecycle(const Arguments& arguments) {
   const std::string name = IndexedShare(arguments.words[0]);
   fileindex::ShareCheckRecycle(name);
-  (void)printf("the recycle bin of share %s is compared with the index again\n", EscapeForTerminal(name).c_str());
+  (void)printf("the recycle bin of share %s will be compared with the index\n", EscapeForTerminal(name).c_str());
   return kDone;
 }
 
@@ -158,10 +159,10 @@ int RunUserRename(const Arguments& arguments) {
   for (const std::string& name : arguments.words) {
     if (!IsPathName(name)) throw UsageError("\"" + EscapeForTerminal(name) + "\" cannot be a user's name");
   }
-  if (old_name == new_name) throw UsageError("the new name is the old one");
+  if (old_name == new_name) throw UsageError("the old and the new name are the same");
   RequireRenamed(old_name, new_name);
   ChangeConfiguration([&] { fileindex::UserRename(old_name, new_name); });
-  (void)printf("%s/%s: the index follows\n", EscapeForTerminal(sdk::SDKShare(kHomes).GetPath()).c_str(),
+  (void)printf("%s/%s: its index follows\n", EscapeForTerminal(sdk::SDKShare(kHomes).GetPath()).c_str(),
                EscapeForTerminal(new_name).c_str());
   return kDone;
 }

@@ -41,7 +41,7 @@ Scope ReadScope(const Arguments& arguments, Found& found) {
     scope.shares.assign(indexed.begin(), indexed.end());
   } catch (const Error& error) {
     scope.known = false;
-    found.left_out.Add("", error.Code(), "those without an index are not known: " + Explain(error));
+    found.left_out.Add("", error.Code(), "which shares have no index is not known: " + Explain(error));
   }
   return scope;
 }
@@ -71,7 +71,7 @@ bool IsFresh(const Arguments& arguments, Scope& scope, Found& found) try {
 } catch (const Failure& failure) {
   const bool goes_on = arguments.Has("--partial");
   Warn(failure.what());
-  (void)fprintf(stderr, "%s\n", goes_on ? "What is shown is what is indexed by now." : kWithoutFresh);
+  (void)fprintf(stderr, "%s\n", goes_on ? "Shown is what has been indexed so far." : kWithoutFresh);
   return goes_on;
 }
 
@@ -105,7 +105,10 @@ int RunSearch(const Arguments& arguments) {
   if (arguments.Has("--fresh") && !IsFresh(arguments, scope, found)) return kIncomplete;
   SearchIn(arguments, scope, found);
   found.not_noticed = NotNoticed();
-  return PrintFound(arguments, std::move(found));
+  const int code = PrintFound(arguments, std::move(found));
+  if (scope.known && scope.shares.empty())
+    Warn("no folder is indexed yet; 'fileindexctl share add FOLDER' indexes one");
+  return code;
 }
 
 }  // namespace ferrox::cli

@@ -89,7 +89,7 @@ int ReportPause(void (*change)(int hours), int hours, const std::string& report)
     change(hours);
   } catch (const Error& error) {
     if (error.Code() != Error::kInternal) throw;
-    (void)printf("%s (the index daemon does not run; it will take note when it starts)\n", report.c_str());
+    (void)printf("%s (the index daemon does not run; it will see this when it starts)\n", report.c_str());
     return kDone;
   }
   (void)printf("%s\n", report.c_str());
@@ -150,7 +150,7 @@ int RunPause(const Arguments& arguments) {
 }
 
 int RunResume(const Arguments&) {
-  return ReportPause([](int) { fileindex::StatusMgr().Resume(); }, 0, "indexing goes on");
+  return ReportPause([](int) { fileindex::StatusMgr().Resume(); }, 0, "indexing is resumed");
 }
 
 }  // namespace ferrox::cli

@@ -12,6 +12,7 @@
 #include "cli/explain.h"
 #include "cli/output.h"
 #include "cli/own_share.h"
+#include "cli/preview.h"
 #include "cli/rights.h"
 #include "cli/share_remains.h"
 #include "common/error.h"
@@ -30,9 +31,9 @@ namespace {
 /// The folder without links, "." and "..", which is what a share's folder must be.
 std::string RealFolder(const std::string& folder) {
   const std::string real = RealPath(folder);
-  if (real.empty() && errno == ENOENT) throw Failure(folder + ": no such folder; make it first");
+  if (real.empty() && errno == ENOENT) throw Failure(folder + ": there is no such folder; make it first");
   if (real.empty()) ThrowSystemFailure(errno, "look at", folder);
-  if (!IsDirExist(real, false)) throw Failure(folder + " is no folder; a share must be one");
+  if (!IsDirExist(real, false)) throw Failure(folder + " is not a folder; only a folder can be a share");
   return real;
 }
 
@@ -73,8 +74,8 @@ void RemoveShare(const std::string& name) {
   if (!folders.empty()) ChangeConfiguration([&] { fileindex::FolderDelete(folders); });
   DropRemains(name, queue_path);
   kova::host::RemoveShare(name);
-  (void)printf("share %s and its index are gone; its folder is as it was%s%s\n", EscapeForTerminal(name).c_str(),
-               outer.empty() ? "" : ", and found again in share ", EscapeForTerminal(outer).c_str());
+  (void)printf("share %s and its index are removed; its files were not touched%s%s\n", EscapeForTerminal(name).c_str(),
+               outer.empty() ? "" : ", and are found in share ", EscapeForTerminal(outer).c_str());
 }
 
 /// True when the folder is that share already.
@@ -116,9 +117,8 @@ void IndexWholeShare(const std::string& name, bool added) {
   try {
     fileindex::FolderAdd(list, false);
   } catch (const Error& error) {
-    const std::string left = TakeBack(name, added)
-                                 ? (added ? "the share is not added" : "the share is not indexed")
-                                 : "'fileindexctl share remove " + name + "' takes back what was done";
+    const std::string left = TakeBack(name, added) ? (added ? "the share was not added" : "the share was not indexed")
+                                                   : "'fileindexctl share remove " + name + "' undoes what was done";
     throw Failure(Explain(error, left));
   }
 }
@@ -129,13 +129,28 @@ void PrintNesting(const kova::host::ShareEntry& added) {
   if (indexed.count(added.name) == 0) return;
   for (const auto& share : kova::host::ListShares()) {
     if (indexed.count(share.name) == 0 || !base::IsBelow(share.path, added.path)) continue;
-    (void)printf("share %s lies in it and keeps its files, which are found there alone\n",
+    (void)printf("share %s lies in it: its files are found in that share only\n",
                  EscapeForTerminal(share.name).c_str());
   }
   const std::string outer = OuterOf(added.path);
   if (outer.empty()) return;
-  (void)printf("it lies in share %s, which leaves it out: its files are found in share %s alone\n",
+  (void)printf("it lies in share %s, which leaves it out: its files are found in share %s only\n",
                EscapeForTerminal(outer).c_str(), EscapeForTerminal(added.name).c_str());
+}
+
+/// What the table of shares would refuse is refused here, too.
+int PreviewShare(const Arguments& arguments, const kova::host::ShareEntry& entry) {
+  std::string problem = kova::host::ShareTextProblem(entry.name, entry.path);
+  if (problem.empty()) problem = kova::host::ShareFolderProblem(entry);
+  if (!problem.empty()) throw Failure(problem);
+  if (IsShare(entry.name)) {
+    const std::string path = sdk::SDKShare(entry.name).GetPath();
+    (void)fprintf(stderr, "there is a share %s already: %s\n", EscapeForTerminal(entry.name).c_str(),
+                  EscapeForTerminal(path).c_str());
+  }
+  ShowPreview(entry.path, entry.path, entry.path, Kinds(std::string("all")), {}, arguments.Has("--json"));
+  if (!arguments.Has("--json")) (void)printf("nothing was changed\n");
+  return kDone;
 }
 
 }  // namespace
@@ -146,6 +161,7 @@ int RunShareAdd(const Arguments& arguments) {
   kova::host::ShareEntry entry;
   entry.path = RealFolder(arguments.words[0]);
   entry.name = arguments.Get("--name", Basename(entry.path));
+  if (IsDryRun(arguments)) return PreviewShare(arguments, entry);
   if (!arguments.Has("--no-index")) RequireEngine();
   const bool known = MakeWay(entry, arguments.Has("--replace"));
   if (!known) kova::host::AddShare(entry);

@@ -77,7 +77,7 @@ bool RenameFolder(const std::string& from, const std::string& to) {
   const bool old_there = Exists(from);
   const bool new_there = Exists(to);
   if (old_there && new_there) throw Failure(to + " exists already; move it away, or choose another name");
-  if (!old_there && !new_there) throw Failure(from + " is not there; bring it back first");
+  if (!old_there && !new_there) throw Failure(from + " does not exist; bring it back first");
   if (new_there) return false;
   if (rename(from.c_str(), to.c_str()) != 0) {
     ThrowSystemFailure(errno, "rename", from, "; rename it yourself to " + to + ", then run this command again");
@@ -199,9 +199,9 @@ Move RenameHere(const std::string& from, const std::string& to) {
 int RunShareRename(const Arguments& arguments) {
   const std::string& from = arguments.words[0];
   const std::string& to = arguments.words[1];
-  if (from == to) throw UsageError("the new name is the old one");
+  if (from == to) throw UsageError("the old and the new name are the same");
   if (!IsPathName(to)) {
-    throw UsageError("\"" + EscapeForTerminal(to) + "\" cannot be a share's name: give the last part of the path");
+    throw UsageError("\"" + EscapeForTerminal(to) + "\" cannot be a share's name; give a name without \"/\"");
   }
   RequireEngine();
   const Move move = !IsShare(from) && IsShare(to) ? RenamedBefore(from, to) : RenameHere(from, to);
@@ -221,7 +221,7 @@ int RunShareMigrate(const Arguments& arguments) {
   const Move move = {name, name, arguments.Has("--from") ? AbsolutePath(arguments.Get("--from")) : here, new_path};
   const std::string again = "fileindexctl share migrate " + name + " " + new_path + " --from " + move.old_path;
   if (move.old_path == new_path) {
-    throw Failure("share " + name + " is at " + new_path + " already; tell with --from where it was");
+    throw Failure("share " + name + " is at " + new_path + " already; --from says where it was before");
   }
   RequireEngine();
   if (here != new_path) {

@@ -9,7 +9,9 @@
 #include "cli/format.h"
 #include "cli/left_out.h"
 #include "cli/output.h"
+#include "cli/share_place.h"
 #include "cli/user_commands.h"
+#include "cli/why_not_indexed.h"
 #include "common/file_util.h"
 #include "fileindex/elastic/elastic_control.h"
 #include "fileindex/folders/folder_mgr.h"
@@ -38,13 +40,14 @@ Json::Value Entries(const std::string& share, const wire::DocumentQuery& query) 
 bool Show(const std::string& file, const Arguments& arguments, LeftOut& left_out) {
   const std::string share_path = ToSharePath(file, fileindex::FolderMgr());
   const std::string path = fileindex::GetFullPath(share_path);
-  const std::string share = fileindex::GetShareNameByPath(share_path);
+  const std::string holder = IndexedShareOf(path).share;
+  const std::string share = holder.empty() ? fileindex::GetShareNameByPath(share_path) : holder;
   Json::Value documents;
   if (!left_out.Unless(share, [&] { documents = Entries(share, {wire::OnlyAt(path)}); })) return false;
   if (documents.empty()) {
     if (left_out.AddIfRebuilding(share)) return false;
-    (void)fprintf(stderr, "%s is not in the index; 'fileindexctl index %s' looks for what is not\n",
-                  EscapeForTerminal(path).c_str(), EscapeForTerminal(share).c_str());
+    (void)fprintf(stderr, "%s is not in the index: %s\n", EscapeForTerminal(path).c_str(),
+                  EscapeForTerminal(WhyNotIndexed(path, share)).c_str());
     return false;
   }
   const Json::Value texts = Entries(share, {wire::OnlyAt(path), {kKOVAMDTextContent}});
@@ -55,7 +58,8 @@ bool Show(const std::string& file, const Arguments& arguments, LeftOut& left_out
     if (!text.empty()) documents[0][kKOVAMDTextContent] = text;
     PrintJson(documents[0]);
   } else {
-    PrintDocument(documents[0], text, Fields::kAll);
+    const bool is_unwanted = !documents[0][k_KOVANeedMeta].isBool() && !BoolOf(documents[0], kKOVAMDIsDir);
+    PrintDocument(documents[0], text, Fields::kAll, is_unwanted ? WhyNameOnly(path) : "");
   }
   return true;
 }
@@ -142,7 +146,7 @@ int RunUnread(const Arguments& arguments) {
     folders += ListLeftOut(daemon, share, arguments.Has("--json"));
   }
   FlushOutput();
-  (void)fprintf(stderr, "%s files could not be read, or not all of them\n", Count(count).c_str());
+  (void)fprintf(stderr, "%s files could not be read, or only in part\n", Count(count).c_str());
   if (folders != 0) (void)fprintf(stderr, "%s folders are left out\n", Count(folders).c_str());
   left_out.Warn();
   return left_out.Empty() ? kDone : kIncomplete;

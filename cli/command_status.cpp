@@ -94,7 +94,7 @@ std::string ContentExtractionText(const Json::Value& daemon) {
                      " of at most " + Count(UintOf(daemon, "workers_max")) + " workers, " +
                      Count(UintOf(daemon, "files")) + " files read";
   const uint64_t blamed = UintOf(daemon, "blamed");
-  if (blamed != 0) text += ", of which " + Count(blamed) + " broke a worker";
+  if (blamed != 0) text += ", of which " + Count(blamed) + " crashed a worker";
   for (const Json::Value& piece : daemon["missing"]) {
     if (piece.isString())
       text += "\n    the workers lack a protection on this system: " + EscapeForTerminal(piece.asString());
@@ -102,7 +102,8 @@ std::string ContentExtractionText(const Json::Value& daemon) {
   text += UnresponsiveText(daemon);
   for (const Json::Value& program : daemon["not_installed"]) {
     if (program.isString())
-      text += "\n    not installed: " + EscapeForTerminal(program.asString()) + "; what it reads is found by name only";
+      text += "\n    not installed: " + EscapeForTerminal(program.asString()) +
+              "; files that it would read are found by name only";
   }
   return text;
 }
@@ -225,9 +226,10 @@ void PrintShares(const Report& report) {
   for (const Json::Value& share : report.resting) {
     (void)printf("share %s: %s; %s\n", EscapeForTerminal(TextOf(share, "share")).c_str(),
                  FoldersText(UintOf(share, "folders")).c_str(),
-                 share["paused"].asBool()                    ? "paused until 'fileindexctl share resume'"
-                 : report.state.index_daemon.problem.empty() ? "nothing works on it now"
-                                                             : "what is done with it is not known");
+                 share["paused"].asBool() ? "paused until 'fileindexctl share resume'"
+                 : report.state.index_daemon.problem.empty()
+                     ? "nothing works on it now; 'fileindexctl up' starts what is missing"
+                     : "its state is not known, since the index daemon does not answer");
   }
 }
 

@@ -91,7 +91,7 @@ std::vector<Command> FolderCommands() {
   return {
       {"folder add",
        "PATH...",
-       {kinds, kName},
+       {kinds, kName, kDryRun, kDryRunJson},
        "Indexes folders, with the content of all kinds of files unless --kinds says otherwise. Adds all of the folders "
        "or none.",
        &RunFolderAdd,

@@ -13,6 +13,10 @@ struct CommandGroup {
   std::vector<Command> commands;
 };
 
+/// Options of the commands that show what they would do (preview.h).
+inline const Option kDryRun = {"--dry-run", nullptr, "only count what would be indexed, and change nothing"};
+inline const Option kDryRunJson = {"--json", nullptr, "with --dry-run: one line of JSON for each folder, for scripts"};
+
 /// All commands, in the order in which the help shows them.
 const std::vector<CommandGroup>& CommandTable();
 

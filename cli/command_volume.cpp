@@ -38,7 +38,7 @@ std::string Volume(const std::string& word, const std::string& verb) {
   const std::string real = RealPath(given);
   const std::string volume = real.empty() ? given : real;
   if (kova::host::IsMountRoot(volume) == 1 || (verb != "pause" && WasPausedWith(volume))) return volume;
-  if (!Exists(volume)) throw Failure(volume + " is not there, and no folder was paused with it; give a mount point");
+  if (!Exists(volume)) throw Failure(volume + " does not exist, and no folder was paused with it; give a mount point");
   const std::string mount_point = kova::host::MountPointOf(volume);
   throw Failure(volume + " is no mount point; it lies on the volume " + mount_point + ": 'fileindexctl volume " + verb +
                 " " + mount_point + "' is for all of that, 'fileindexctl share " + verb + "' for one share");

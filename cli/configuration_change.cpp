@@ -36,8 +36,8 @@ void ChangeConfiguration(const std::function<void()>& change) {
     const auto* stopped = dynamic_cast<const fileindex::OperationError*>(&error);
     std::string note = stopped == nullptr ? "" : "not done: " + stopped->NotDoneText() + "; ";
     note += FoldersFile() == before
-                ? "the list of indexed folders is as it was"
-                : "the list of indexed folders is changed, but the index may not follow: run 'fileindexctl up', then "
+                ? "the list of indexed folders was not changed"
+                : "the list of indexed folders was changed, but the index may not follow: run 'fileindexctl up', then "
                   "'fileindexctl index' with the share's name";
     throw Failure(Explain(error, note));
   }
@@ -57,7 +57,10 @@ int ChangeAndReport(const std::function<void()>& change, const std::string& noth
     // No operation that is reported in this way adds a folder, so that the list of before has them all.
     if (now != nullptr && now->IsPaused() == folder->IsPaused()) continue;
     changed = true;
-    (void)printf("%s: %s\n", path.c_str(), now == nullptr ? "forgotten" : now->IsPaused() ? "paused" : "goes on");
+    (void)printf("%s: %s\n", path.c_str(),
+                 now == nullptr    ? "no longer indexed"
+                 : now->IsPaused() ? "paused"
+                                   : "resumed");
   }
   if (!changed) (void)printf("%s\n", EscapeForTerminal(nothing).c_str());
   return kDone;

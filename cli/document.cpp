@@ -34,9 +34,11 @@ void PrintLine(const std::string& name, const std::string& value) {
 }
 
 /// Whether the content was read, by what, and why not.
-std::string Reading(const Json::Value& document) {
+std::string Reading(const Json::Value& document, const std::string& unwanted) {
   if (BoolOf(document, kKOVAMDIsDir)) return "a folder";
-  if (!document[k_KOVANeedMeta].isBool()) return "not wanted; 'fileindexctl folder set --kinds' chooses what is read";
+  if (!document[k_KOVANeedMeta].isBool()) {
+    return "found by its name only" + (unwanted.empty() ? "" : ": " + EscapeForTerminal(unwanted));
+  }
   const std::string error = TextOf(document, k_KOVAExtractError);
   const std::string reader = " (reader version " + std::to_string(IntOf(document, k_KOVAExtractVersion)) + ")";
   if (StringStartWith(error, kPartlyRead)) return EscapeOneLine(error) + reader;
@@ -78,9 +80,9 @@ std::string FieldText(const std::string& field, const Json::Value& value) {
   return joined;
 }
 
-void PrintDocument(const Json::Value& document, const std::string& text, Fields fields) {
+void PrintDocument(const Json::Value& document, const std::string& text, Fields fields, const std::string& unwanted) {
   (void)printf("%s\n", EscapeForTerminal(TextOf(document, kKOVAMDPath)).c_str());
-  if (fields == Fields::kAll || BoolOf(document, kKOVAMDIsDir)) PrintLine("content", Reading(document));
+  if (fields == Fields::kAll || BoolOf(document, kKOVAMDIsDir)) PrintLine("content", Reading(document, unwanted));
   if (document.isMember(kKOVAMDContentType)) PrintLine("type", EscapeOneLine(TextOf(document, kKOVAMDContentType)));
   PrintLine("size", Size(IntOf(document, kKOVAMDFSSize)));
   for (const std::string& field : document.getMemberNames()) {

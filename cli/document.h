@@ -14,8 +14,10 @@ enum class Fields {
   kPublic,  ///< what ordinary users get
 };
 
-/// Everything that the index has of the file, the fields under short names, and the beginning of `text`.
-void PrintDocument(const Json::Value& document, const std::string& text, Fields fields);
+/// Everything that the index has of the file, the fields under short names, and the beginning of `text`. `unwanted`:
+/// why its content was not wanted, where that is known.
+void PrintDocument(const Json::Value& document, const std::string& text, Fields fields,
+                   const std::string& unwanted = {});
 
 /// "KOVAMDTitle" is "Title", "KOVAStateOrProvince" "StateOrProvince".
 std::string FriendlyName(const std::string& field);

@@ -37,7 +37,7 @@ constexpr Remedy kRemedies[] = {
     {Error::kLockFailed, "another program works on it; try again"},
     {Error::kNoSuchShare, "'fileindexctl share list' shows the shares"},
     {Error::kTooManyFolders, "one folder above several of them does instead; 'fileindexctl folder list' shows them"},
-    {Error::kDuplicatedFolder, "'fileindexctl folder set' changes it"},
+    {Error::kDuplicatedFolder, "'fileindexctl folder set' changes its kinds"},
     {Error::kNoSuchFolder, "'fileindexctl folder list' shows the indexed folders"},
     {Error::kMalformedEvent, "'fileindexctl index' with the share's name compares everything anew"},
     {Error::kEngineUnreachable, "'fileindexctl up' starts the search engine"},
@@ -115,7 +115,7 @@ std::string Sentence(const Error& error) {
     case Error::kTooManyFolders:
       return "there would be too many indexed folders: at most 1000";
     default:
-      return reason.empty() ? "that did not work" : reason;
+      return reason.empty() ? "the operation failed" : reason;
   }
 }
 

@@ -18,6 +18,7 @@
 #include "cli/escape.h"
 #include "cli/format.h"
 #include "cli/output.h"
+#include "cli/why_not_indexed.h"
 #include "fileindex/elastic/elastic_control.h"
 #include "sdk/share.h"
 #include "wire/engine_requests.h"
@@ -130,7 +131,7 @@ std::string WhyNotByIndex(const AccessWay& way, const std::string& root, const s
   if (!closed.empty()) return closed;
   const std::string& path = way.steps.back().path;
   const Json::Value document = DocumentAt(path, share);
-  if (document.isNull()) return "it is not in the index; 'fileindexctl index " + share + "' looks for what is not";
+  if (document.isNull()) return "it is not in the index: " + WhyNotIndexed(path, share);
   const std::string rights = OtherRightsInIndex(way, root, share, user);
   if (!rights.empty()) return rights + "; 'fileindexctl index " + share + "' compares them";
   struct stat status = {};

@@ -67,8 +67,11 @@ std::string OnDisk(const std::string& text, const fileindex::FolderMgr& configur
   }
   if (real.empty()) (void)Exists(path);
   if (!real.empty()) {
-    throw Failure(text + " lies in no share; 'fileindexctl share add " + real + "' makes it one, 'fileindexctl share " +
-                  "list' shows the shares");
+    const std::string folder = IsDirExist(real, false) ? real : Dirname(real);
+    throw Failure(text + " lies in no share; 'fileindexctl share add " + folder + "' makes " +
+                  (folder == real ? "it" : "its folder") + " one" +
+                  (sdk::SDKShare::Enum().empty() ? ", of which there are none yet"
+                                                 : ", 'fileindexctl share list' shows the shares"));
   }
   const std::string meant = PathMeant(text, configured);
   throw Failure(text + " is neither in a share nor on the disk" + meant + (meant.empty() ? ";" : "") +
@@ -92,7 +95,7 @@ std::string FromWorkingFolder(const std::string& text, const char* what) {
   if (!text.empty() && text[0] == '/') return text;
   char folder[PATH_MAX];
   if (getcwd(folder, sizeof(folder)) == nullptr) {
-    throw Failure(std::string("the working folder cannot be told; give ") + what);
+    throw Failure(std::string("the current folder is not known; give ") + what);
   }
   return std::string(folder) + "/" + text;
 }

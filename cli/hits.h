@@ -12,7 +12,8 @@
 namespace ferrox::cli {
 
 /// Said when --fresh shows nothing.
-inline constexpr char kWithoutFresh[] = "Without --fresh, or with --partial, the search shows what is indexed by now.";
+inline constexpr char kWithoutFresh[] =
+    "Without --fresh, or with --partial, the search shows what has been indexed so far.";
 
 /// The members of the engine's "search" that follow from words and options; which shares are searched is not among
 /// them. @throws UsageError, so that wrong usage is found before anything waits.

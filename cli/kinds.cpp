@@ -5,8 +5,25 @@
 #include "cli/command.h"
 #include "cli/did_you_mean.h"
 #include "cli/format.h"
+#include "fileindex/util.h"
 
 namespace ferrox::cli {
+
+namespace {
+
+size_t KindAt(const std::string& path) { return static_cast<size_t>(fileindex::GetFileTypeByFullPath(path)); }
+
+}  // namespace
+
+std::string KindNameOf(const std::string& path) {
+  const size_t kind = KindAt(path);
+  return kind < kKinds.size() ? kKinds[kind] : "";
+}
+
+bool Kinds::WantsContent(const std::string& path) const {
+  const size_t kind = KindAt(path);
+  return kind >= chosen_.size() || chosen_[kind];
+}
 
 /// An empty name between two commas is refused like any other that is not known.
 Kinds::Kinds(const std::string& text) {

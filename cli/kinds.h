@@ -13,6 +13,9 @@ namespace ferrox::cli {
 /// names.
 inline constexpr auto& kKinds = fileindex::kContentKindNames;
 
+/// The name of a file's kind by its extension; "" for one of none of these kinds.
+std::string KindNameOf(const std::string& path);
+
 /// A choice of kinds: of which files of a folder the content is indexed. Files of all kinds are found by name.
 class Kinds {
  public:
@@ -23,6 +26,8 @@ class Kinds {
 
   /// Sets the members of the stored form of a folder.
   void Store(Json::Value& folder) const;
+  /// Whether the content of a file is indexed: its kind is chosen, or it is of none of these kinds.
+  bool WantsContent(const std::string& path) const;
   /// For people: "document, photo", "all kinds", "names only".
   std::string Text() const;
 

@@ -35,11 +35,10 @@ bool HasFolders(const std::string& share) try {
 
 /// In the words of the tool, where the engine refused with `code` and `reason`.
 std::string WhyUnusable(const std::string& share, int code, const std::string& reason) {
-  if (code == Error::kEngineIndexPaused)
-    return "it is paused; 'fileindexctl share resume " + share + "' goes on with it";
+  if (code == Error::kEngineIndexPaused) return "it is paused; 'fileindexctl share resume " + share + "' resumes it";
   if (code != Error::kEngineNoSuchIndex) return reason;
   if (!HasFolders(share)) return "no folder of it is indexed; 'fileindexctl folder add /" + share + "' adds all of it";
-  return "it has no index yet; the index daemon makes it, 'fileindexctl status' shows what it does";
+  return "it has no index yet; the index daemon will make it; 'fileindexctl status' shows what it is doing";
 }
 
 }  // namespace
@@ -115,7 +114,7 @@ bool LeftOut::Unless(const std::string& share, const std::function<void()>& run)
 void LeftOut::Warn() const {
   for (const Json::Value& entry : list_) {
     const std::string share = TextOf(entry, "share");
-    const std::string what = entry["searched"].asBool() ? "only what is indexed by now: " : "left out: ";
+    const std::string what = entry["searched"].asBool() ? "only what has been indexed so far: " : "left out: ";
     cli::Warn(what + (share.empty() ? "" : "share " + share + ": ") + EscapeOneLine(TextOf(entry, "reason")));
   }
 }

@@ -93,7 +93,7 @@ int Run(std::vector<std::string> words) {
       return kDone;
     }
     if (!IsPrivileged()) return RunForUser(*command, arguments);
-    PrepareInstance(command->needs);
+    PrepareInstance(arguments.Has(kDryRun.name) ? Needs::kAnswers : command->needs);
     return command->run(arguments);
   } catch (const UsageError& error) {
     throw UsageError(WithUsage(*command, error.what()));

@@ -23,33 +23,39 @@ std::string Quoted(const Json::Value& object, const char* key) {
   return "\"" + EscapeOneLine(TextOf(object, key)) + "\"";
 }
 
-/// "searched for "a" as "b" or "c", "d" as "e"". `also`: of words that were searched for as they are, too.
-void PrintRepaired(const Json::Value& result, bool also) {
-  std::string line;
+/// "\"license\" or \"licence\" instead of \"lincense\"", commas between several. `also`: of words that were searched
+/// for as they are, too, "\"book\" beside \"bok\"". "" for none.
+std::string RepairedList(const Json::Value& result, bool also) {
+  std::string list;
   std::string before;
+  const auto end_of = [also](const std::string& from) {
+    return from.empty() ? from : (also ? " beside " : " instead of ") + from;
+  };
   for (const Json::Value& word : result["repaired"]) {
     if (BoolOf(word, "also") != also) continue;
     const std::string from = Quoted(word, "from");
-    line += (from == before ? " or " : (line.empty() ? "" : ", ") + from + " as ") + Quoted(word, "to");
+    list += (from == before ? " or " : end_of(before) + (list.empty() ? "" : ", ")) + Quoted(word, "to");
     before = from;
   }
-  if (!line.empty()) (void)printf("%s %s\n", also ? "also searched for" : "searched for", line.c_str());
+  return list + end_of(before);
 }
 
 }  // namespace
 
 void PrintHowSearched(const Json::Value& result) {
-  PrintRepaired(result, false);
-  PrintRepaired(result, true);
+  const std::string repaired = RepairedList(result, false);
+  const std::string also = RepairedList(result, true);
+  if (!repaired.empty()) (void)printf("searched for %s\n", repaired.c_str());
+  if (!also.empty()) (void)printf("also searched for %s\n", also.c_str());
   const std::string ignored = WordList(result["ignored"]);
-  if (!ignored.empty()) (void)printf("in so many files that they find none by themselves: %s\n", ignored.c_str());
+  if (!ignored.empty()) (void)printf("too common to find files by themselves: %s\n", ignored.c_str());
   const std::string some = Count(UintOf(result, "total"));
   if (BoolOf(result, "none_has_all")) {
-    (void)printf("no file has all words; these have some\n");
+    (void)printf("no file has all words; these have some of them\n");
   } else if (result.isMember("total_all") && UintOf(result, "total_all") == 0) {
-    (void)printf("no file has all words, %s with some\n", some.c_str());
+    (void)printf("no file has all words; %s have some of them\n", some.c_str());
   } else if (result.isMember("total_all")) {
-    (void)printf("%s with all words, %s with some\n", Count(UintOf(result, "total_all")).c_str(), some.c_str());
+    (void)printf("%s with all words, %s with some of them\n", Count(UintOf(result, "total_all")).c_str(), some.c_str());
   }
 }
 
@@ -71,9 +77,14 @@ void PrintExplanation(const Json::Value& hit) {
 }
 
 void PrintNothingFound(const Json::Value& result, bool complete) {
+  std::string sentence = complete ? "nothing found" : "nothing found in what was searched";
+  for (const bool also : {false, true}) {
+    const std::string repaired = RepairedList(result, also);
+    if (!repaired.empty()) sentence += ", nor for " + repaired;
+  }
   const std::string similar = WordList(result["suggestions"]);
-  (void)fprintf(stderr, "%s%s\n", complete ? "nothing found" : "no hit in what was searched",
-                similar.empty() ? "" : (". Did you mean: " + similar + "?").c_str());
+  if (!similar.empty()) sentence += ". Did you mean: " + similar + "?";
+  (void)fprintf(stderr, "%s\n", sentence.c_str());
 }
 
 }  // namespace ferrox::cli

@@ -18,8 +18,8 @@ std::string TitleToShow(const Json::Value& hit, const std::string& path);
 /// What the score of a hit is made of, for --explain: a line for each part.
 void PrintExplanation(const Json::Value& hit);
 
-/// "nothing found" on standard error, or, unless the search was `complete`, that there is no hit in what was searched;
-/// with words of the index that are spelt alike.
+/// One sentence on standard error: that nothing was found, unless the search was `complete` in what was searched; in
+/// which other spellings words were searched for, too; and which words of the index are spelt alike.
 void PrintNothingFound(const Json::Value& result, bool complete);
 
 }  // namespace ferrox::cli

@@ -26,9 +26,9 @@ constexpr seconds kFreshMax(60);       ///< the engine waits no longer for users
 constexpr seconds kSlack(5);           ///< of the engine, when it waits itself
 
 constexpr char kNotAllNoticed[] =
-    "not all of the service runs, so that what has changed since may be missing; its administrator starts it with "
+    "part of the service does not run, so recent changes may be missing; its administrator can start it with "
     "'fileindexctl up'";
-constexpr char kMayBeBehind[] = "it may not hold all that was changed before";
+constexpr char kMayBeBehind[] = "its latest changes may not be indexed yet";
 
 bool Contains(const std::vector<std::string>& names, const std::string& name) {
   return std::find(names.begin(), names.end(), name) != names.end();
@@ -124,7 +124,7 @@ int RunUserSearch(const Arguments& arguments) {
   } catch (const Failure& failure) {
     const bool goes_on = arguments.Has("--partial");
     Warn(failure.what());
-    (void)fprintf(stderr, "%s\n", goes_on ? "What is shown is what is indexed by now." : kWithoutFresh);
+    (void)fprintf(stderr, "%s\n", goes_on ? "Shown is what has been indexed so far." : kWithoutFresh);
     if (!goes_on) return kIncomplete;
   }
   if (found.searched) {

@@ -59,7 +59,8 @@ std::string WatchLines(const Json::Value& share, const std::string& daemon_probl
   const Json::Value& watch = share["watch"];
   if (!daemon_problem.empty()) return std::string(kNotNoticed) + ": the notification daemon " + daemon_problem + "\n";
   if (!watch.isObject() || watch["watches"].empty()) {
-    return std::string(kNotNoticed) + ": nobody asked for it; 'fileindexctl folder set' does so again\n";
+    return std::string(kNotNoticed) +
+           ": its folders are not registered; 'fileindexctl folder set' registers them again\n";
   }
   std::set<std::string> ways;
   for (const Json::Value& folder : watch["watches"]) ways.insert(HowNoticed(folder));
@@ -81,7 +82,8 @@ std::string NotificationDaemonText(const Json::Value& notification_daemon, bool 
   std::string text = "runs, process " + std::to_string(IntOf(notification_daemon, "pid"));
   text += ", " + Count(UintOf(notification_daemon, "changes")) + " changes noticed";
   const uint64_t lost = UintOf(notification_daemon, "lost");
-  if (lost != 0) text += "; the system dropped some " + Count(lost) + " times, what they concerned was compared";
+  if (lost != 0)
+    text += "; the system lost some " + Count(lost) + " times, after which the folders were compared with the index";
   for (const Json::Value& problem : notification_daemon["problems"]) {
     if (problem.isString()) text += "\n    " + EscapeForTerminal(problem.asString());
   }

@@ -38,7 +38,7 @@ TEST(CommandTest, WrongUsageIsRefused) {
 TEST(ExplainTest, SentenceNamesThingRemedyAndCode) {
   EXPECT_EQ("there is no share \"x\"; 'fileindexctl share list' shows the shares (error 800)",
             Explain(Error(Error::kNoSuchShare, "x")));
-  EXPECT_EQ("that did not work (error 1499)", Explain(Error(static_cast<Error::ErrorCode>(1499))));
+  EXPECT_EQ("the operation failed (error 1499)", Explain(Error(static_cast<Error::ErrorCode>(1499))));
   EXPECT_EQ("no; because (error 120)", Explain(Error(Error::kBadArgument, "no"), "because"));
   // What a failure is about decides, whatever its reason says.
   const auto about = [](Error::ErrorCode code, Subject::Kind kind) {

@@ -317,7 +317,7 @@ class ToolTest(ToolCase):
             volume = os.path.dirname(volume)
         if volume != "/":
             self.skipTest("the temporary folder is a volume of its own")
-        for verb, told in (("pause", "paused"), ("resume", "goes on")):
+        for verb, told in (("pause", "paused"), ("resume", "resumed")):
             done = self.run_tool("volume", verb, "/")
             self.assertEqual((0, f"/photo/trip: {told}\n/photos/a b: {told}\n"), (done.returncode, done.stdout.decode()))
         self.assertEqual(["index_pause"] * 2 + ["index_resume"] * 2, [name for name, _ in engine.asked if name != "ping"])
@@ -330,7 +330,7 @@ class ToolTest(ToolCase):
         self.assertEqual((2, True), ((done := self.run_tool("search", "(")).returncode, b"character 1" in done.stderr))
         for folder in ("var/lib/kova/fileindex/queue", "tmp"):
             os.makedirs(f"{self.root}/{folder}")
-        for state, detail, text in (("paused", "", "indexing is paused; share photo is compared when it goes on"),
+        for state, detail, text in (("paused", "", "indexing is paused; share photo is compared afterwards"),
                                     ("error", "no", "share photo: no; the index daemon tries again")):
             share = {"share": "photo", "path": "/v", "state": state, "detail": detail, "queued": 1, "failures": {}}
             daemon = FakeDaemon(self.root, "fileindexd", {"notify_setting_changed": success({}), "status": success(
@@ -370,18 +370,21 @@ class ToolTest(ToolCase):
         shown = self.run_tool("search", "--all-words", "--explain", "x").stdout.decode()
         self.assertTrue(engine.asked[0][1]["all_words"] and engine.asked[0][1]["explain"])
         self.assertTrue(shown.startswith(
-            'searched for "lincense" as "license" or "licence"\nalso searched for "bok" as "book"\n'
-            "in so many files that they find none by themselves: how, do\n12 with all words, 1,340 with some\n"
+            'searched for "license" or "licence" instead of "lincense"\nalso searched for "book" beside "bok"\n'
+            "too common to find files by themselves: how, do\n12 with all words, 1,340 with some of them\n"
             "/v/a.txt\n    The Licence\\x1B\n    document, "), shown)
         self.assertIn("\n    score 2.50\n      +2.25  license in title\n      +0.25  recent\n/v/Notes.txt\n    doc", shown)
         self.assertLessEqual(answer.items(), json.loads(self.run_tool("search", "--json", "x").stdout).items())
-        for total_all, none_has_all, line in ((0, False, "no file has all words, 1,340 with some"),
-                                              (None, True, "no file has all words; these have some")):
+        for total_all, none_has_all, line in ((0, False, "no file has all words; 1,340 have some of them"),
+                                              (None, True, "no file has all words; these have some of them")):
             answer = {"total": 1340, "hits": hits, "none_has_all": none_has_all}
             answer |= {} if total_all is None else {"total_all": total_all}
             self.assertTrue(self.run_tool("search", "x").stdout.decode().startswith(line + "\n/v/a"))
         answer = {"total": 0, "hits": [], "suggestions": ["runs"]}
         self.assertIn(b"nothing found. Did you mean: runs?\n", self.run_tool("search", "x").stderr)
+        answer["repaired"] = repaired
+        self.assertIn('nothing found, nor for "license" or "licence" instead of "lincense", nor for "book" beside "bok". Did',
+                      self.run_tool("search", "x").stderr.decode())
 
     def on_terminal(self, *words, **env):
         """What the tool writes to a terminal of 60 columns."""
@@ -417,6 +420,49 @@ class ToolTest(ToolCase):
         self.assertNotIn("\033]8", self.on_terminal("search", "x", TERM="linux", VTE_VERSION=""))
         self.assertNotIn("tell_fields", (self.run_tool("search", "x"), engine.asked)[1][-1][1])
 
+    def test_show_says_why_a_file_is_not_indexed(self):
+        trip = f"{self.root}/vol/photo/trip"
+        for name in (".DS_Store", "odd", "fine", "../tree/x"):
+            with open(f"{trip}/{name}", "w", encoding="utf-8"):
+                pass
+        os.symlink("fine", f"{trip}/link")
+        share = {"share": "photo", "state": "idle", "failures": {"too odd": {"count": 1, "examples": [f"{trip}/odd"]}}}
+        self.daemon("kovaelasticd", document_get_by_query=success([]), index_stat=success({}))
+        indexd = FakeDaemon(self.root, "fileindexd", {"status": success({"paused": False, "shares": [share]})})
+        rows = [("none", "there is no such file"), ("link", "a link to fine"), (".DS_Store", "a name that systems"),
+                ("../tree/x", f"no indexed folder; 'fileindexctl folder add {self.root}/vol/photo/tree'"),
+                ("odd", "failed: too odd"), ("fine", "'fileindexctl index photo' finds it")]
+        for name, text in rows:
+            done = self.run_tool("show", name, cwd=trip)
+            self.assertEqual(1, done.returncode)
+            self.assertRegex(done.stderr.decode(), f"is not in the index: .*{re.escape(text)}")
+        indexd.close()
+        self.assertIn(b"index daemon does not run", self.run_tool("show", f"{trip}/fine").stderr)
+        self.assertIn(b"'fileindexctl share add /etc' makes its folder one", self.run_tool("show", "/etc/passwd").stderr)
+
+    def test_dry_run_counts_and_changes_nothing(self):
+        folder = f"{self.root}/vol/photo"
+        for name, size in (("a.txt", 3), ("tree/b.mp3", 4), ("tree/deep/c.jpg", 5), ("trip/d.txt", 6), ("tree/.DS_Store", 7)):
+            with open(f"{folder}/{name}", "w", encoding="utf-8") as file:
+                file.write("x" * size)
+        os.symlink("a.txt", f"{folder}/link")
+
+        def files():
+            return sorted((place, names) for place, _, names in os.walk(self.root))
+
+        before = files()
+        done = self.run_tool("folder", "add", "/photo", "--kinds", "document", "--dry-run", "--json")
+        counted = json.loads(done.stdout)
+        self.assertEqual((3, 12, 2, {"files": 1, "bytes": 3}, 1), (
+            counted["files"], counted["bytes"], counted["folders"], counted["content"], counted["links"]), done.stderr)
+        self.assertEqual({"document": {"files": 1, "bytes": 3}, "audio": {"files": 1, "bytes": 4},
+                          "photo": {"files": 1, "bytes": 5}}, counted["kinds"])
+        self.assertEqual([{"path": f"{folder}/trip", "reason": "it is indexed already"}], counted["left_out"])
+        shown = self.run_tool("share", "add", f"{self.root}/vol/photo/tree", "--dry-run").stdout.decode()
+        self.assertTrue(shown.startswith(f"{folder}/tree: 2 files, 9 B, in 2 folders\n"), shown)
+        self.assertEqual(before, files())
+        self.assertEqual(3, self.run_tool("folder", "add", "/photo/trip", "--dry-run").returncode)
+
     def test_status_tells_how_changes_are_noticed(self):
         shares = [{"share": name, "path": "/v/" + name, "queue": "/q/" + name, "state": "idle", "oldest_change": 2000,
                    "failures": {}, "index": {"error": {"code": 1407, "msg": name + " is torn"}}}
@@ -438,7 +484,7 @@ class ToolTest(ToolCase):
                          ": the disk is full\n", "index: cannot be searched: none is torn\n",
                          "    changes in /v/a by inotify (fanotify is missing)\n"
                          "    changes in /v/b by fanotify, not yet everywhere\n",
-                         "    changes are not noticed, 'fileindexctl index' looks for them: nobody asked"):
+                         "    changes are not noticed, 'fileindexctl index' looks for them: its folders are not registered"):
             self.assertIn(expected, shown)
         status = json.loads(self.run_tool("status", "--json").stdout)
         self.assertEqual(6, status["notification_daemon"]["pid"])
@@ -518,9 +564,9 @@ class ToolTest(ToolCase):
             (["search", "("], {"search": refused(1403, "character 1")}, 2, "character 1", None),
             (["search", "--as", "bin", "x"], {}, 5, "only root and the owner", None),
             (["search", "--fresh", "x"], {"fresh": success({"behind": ["photos"]}), "shares": shares, "search": success(found)},
-             4, "left out: share photos: it may not", ["photo"]),
+             4, "left out: share photos: its latest changes", ["photo"]),
             (["search", "--fresh", "--partial", "x"], {"fresh": success({"behind": ["photos"]}), "search": success(found)},
-             0, "only what is indexed by now: share photos", None),
+             0, "only what has been indexed so far: share photos", None),
             (["search", "--fresh", "x"], {"fresh": refused(502, "gone")}, 4, "gone\nWithout --fresh", None),
             (["show", "/v/f"], {"show": success({"document": {"KOVAMDPath": "/v/f", "KOVAMDTextContent": "deep"}})}, 0,
              "^/v/f\n    size: 0 B\n    text: 4 B\n        deep\n$", None),

@@ -371,7 +371,7 @@ class LiveTest(unittest.TestCase):
         expect(outer=outer, deep5=deep)
         self.assertEqual(read[0] + 21, self.instance.share_status("outer")["read"], "what came to it alone is read")
         self.assertEqual(21, len(self.instance.search("--fresh", "duck")))
-        self.assertIn("found again in share outer", ctl("share", "remove", "deep5"))
+        self.assertIn("are found in share outer", ctl("share", "remove", "deep5"))
         expect(outer=outer)
 
     def test_idle_instance_does_nothing(self):

@@ -150,7 +150,7 @@ class ManagementWalkTest(InstanceTestCase):
         self.instance.wait_idle("homes", homes)
         self.expect_found("capybara", f"{homes}/carla/notes/diary.txt", f"{homes}/annabel/notes/diary.txt")
         self.ctl("suggest-refresh", "homes")
-        self.assertIn(b'as "capybara"', self.instance.run("search", "--share", "homes", "capybaar").stdout)
+        self.assertIn(b'for "capybara"', self.instance.run("search", "--share", "homes", "capybaar").stdout)
 
     def delete_all(self, papers):
         self.ctl("folder", "delete", "/papers/letters")
@@ -206,7 +206,7 @@ class ManagementWalkTest(InstanceTestCase):
             (None, "already", ["share", "rename", "photo", "photos"]),
             (None, "no share", ["share", "rename", "nonexistent", "photo"]),
             (None, "exists already", ["share", "rename", "photo", "taken"]),
-            (None, "not there", ["share", "rename", "gone", "here"]),
+            (None, "does not exist", ["share", "rename", "gone", "here"]),
             (None, "already", ["share", "migrate", "photo", photo]),
             (None, "", ["share", "migrate", "photo", f"{self.vol}/nowhere"]),
             (800, "homes", ["user", "rename", "a", "b"]),
@@ -215,7 +215,7 @@ class ManagementWalkTest(InstanceTestCase):
             (None, "no folder of share", ["share", "check-recycle", "photos"]),
             *((None, f"{self.vol} is no mount point; it lies on the volume /", ["volume", verb, self.vol])
               for verb in ("pause", "resume", "forget")),
-            (None, "is not there", ["volume", "pause", f"{self.vol}/pho"]),
+            (None, "does not exist", ["volume", "pause", f"{self.vol}/pho"]),
             (800, "share list", ["suggest-refresh", "nonexistent"]),
         ]
         for code, text, words in rows:
@@ -234,7 +234,7 @@ class ManagementWalkTest(InstanceTestCase):
         self.expect_refused(913, "share", "add", media, text="'fileindexctl up'")
         self.ctl("up")
         os.mkdir(f"{self.instance.root}/var/packages/Ferrox/etc/fileindex.folders.new")  # stops root's writing, too
-        self.expect_refused(505, "share", "add", media, text="the share is not added")
+        self.expect_refused(505, "share", "add", media, text="the share was not added")
         os.rmdir(f"{self.instance.root}/var/packages/Ferrox/etc/fileindex.folders.new")
         self.assertEqual((shares, {}, []), (self.ctl("share", "list"), self.indices(), self.files_below("var/lib/kova/notifyd/queues")))
         self.ctl("folder", "add", "/docs")
