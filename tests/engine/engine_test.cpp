@@ -53,7 +53,7 @@ TEST_F(EngineTest, BadRequestsAreAnsweredWithTheirCode) {
       {"search", R"({"query":"a","sort":"colour"})", 1403},
       {"search", R"({"query":"a","offset":-1})", 1403},
       {"search", R"({"query":"a","id":"none"})", 1404},
-      {"search", R"({"query":"(a"})", 1403},
+      {"search", R"({"query":"size:big"})", 1403},
       {"search", R"({})", 1403},
       {"document_del_by_id", R"({"id":"a","doc_id":"/never/there"})", 0},
       {"ping", "{}", 0},

@@ -105,6 +105,7 @@ MergedReply AddUp(std::vector<IndexReply>& replies) {
     merged.ranking_bounded = merged.ranking_bounded || reply.ranking_bounded;
     merged.none_has_all = merged.none_has_all || reply.none_has_all;
     std::move(reply.suggestions.begin(), reply.suggestions.end(), std::back_inserter(merged.suggestions));
+    std::move(reply.hints.begin(), reply.hints.end(), std::back_inserter(merged.hints));
     MergeRepaired(merged.repaired, std::move(reply.repaired));
     if (reply.total == 0) continue;
     if (none_found) merged.ignored = std::move(reply.ignored);
@@ -115,6 +116,7 @@ MergedReply AddUp(std::vector<IndexReply>& replies) {
   }
   if (total_all != merged.total) merged.total_all = total_all;
   MakeUnique(merged.suggestions);
+  MakeUnique(merged.hints);
   return merged;
 }
 

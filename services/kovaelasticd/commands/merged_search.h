@@ -37,6 +37,7 @@ struct MergedReply {
   std::vector<RepairedWord> repaired;    ///< of each index, each once
   std::vector<IndexHit> hits;            ///< the page
   std::vector<std::string> suggestions;  ///< of each index, each once
+  std::vector<std::string> hints;        ///< likewise
 };
 
 /// Called with an index that cannot be searched; throws when the whole search is to fail.

@@ -25,13 +25,19 @@ Json::Value PartJson(const ScorePart& part) {
 
 }  // namespace
 
-void AddTotalsAndWords(Json::Value& result, const MergedReply& found) {
+void AddTotalsAndWords(Json::Value& result, const MergedReply& found, const std::vector<std::string>& query_hints) {
   result["total"] = Json::Int64(found.total);
   if (found.total_all.has_value()) result["total_all"] = Json::Int64(*found.total_all);
   if (!found.ignored.empty()) result["ignored"] = Vec2JsonArr(found.ignored);
   for (const RepairedWord& word : found.repaired) result["repaired"].append(RepairedJson(word));
   if (found.none_has_all) result["none_has_all"] = true;
   if (found.total == 0 && !found.suggestions.empty()) result["suggestions"] = Vec2JsonArr(found.suggestions);
+  for (const std::vector<std::string>* hints : {&query_hints, &found.hints}) {
+    for (const std::string& hint : *hints) {
+      if (result["hints"].size() < kQueryHintsMax) result["hints"].append(hint);
+    }
+  }
+  if (result["hints"].empty()) result.removeMember("hints");
 }
 
 void AddFieldsAskedFor(Json::Value& result, const QueryNode& query) {

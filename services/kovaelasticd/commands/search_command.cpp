@@ -6,7 +6,6 @@
 
 #include "common/clock.h"
 #include "common/error.h"
-#include "common/json_util.h"
 #include "services/kovaelasticd/commands/asked_ids.h"
 #include "services/kovaelasticd/commands/commands.h"
 #include "services/kovaelasticd/commands/entered_shares.h"
@@ -82,7 +81,7 @@ Json::Value SearchEverything(const CommandCall& call, const SearchRequest& reque
                "it is being rebuilt, because " + index.open.rebuild.Reason(), true);
   }
   Json::Value result;
-  AddTotalsAndWords(result, found);
+  AddTotalsAndWords(result, found, query.hints);
   result["ranking_bounded"] = found.ranking_bounded;
   result["next_offset"] = Json::Int64(request.offset + std::ssize(found.hits));
   result["hits"] = Json::Value(Json::arrayValue);
@@ -93,6 +92,13 @@ Json::Value SearchEverything(const CommandCall& call, const SearchRequest& reque
   return result;
 }
 
+/// Whether the query has words that documents are ranked by.
+bool HasWords(const QueryNode& query) {
+  if (query.type == QueryNode::Type::kNot) return false;
+  return query.type == QueryNode::Type::kText || query.type == QueryNode::Type::kField ||
+         query.type == QueryNode::Type::kName || std::any_of(query.children.begin(), query.children.end(), &HasWords);
+}
+
 }  // namespace
 
 Json::Value RunSearch(CommandCall& call) {
@@ -100,10 +106,10 @@ Json::Value RunSearch(CommandCall& call) {
   AskedQuery query;
   query.tree = ParseQuery(RequiredText(call.data, "query"), Clock::Get().Now(), &query.hints);
   request.query = &query.tree;
+  if (request.sort == SortKey::kRelevance && !HasWords(query.tree)) request.sort = SortKey::kDate;
   const std::optional<Asker> asker = AskerOf(call.caller, call.data, call.named);
   Json::Value result =
       asker.has_value() ? SearchForUser(call, *asker, request, query) : SearchEverything(call, request, query);
-  if (!query.hints.empty()) result["hints"] = Vec2JsonArr(query.hints);
   if (OptionalBool(call.data, "tell_fields", false)) AddFieldsAskedFor(result, query.tree);
   return result;
 }

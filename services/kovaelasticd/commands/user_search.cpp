@@ -108,7 +108,7 @@ Json::Value SearchForUser(const CommandCall& call, const Asker& asker, const Sea
     AddLeftOutShare(scope, index.open.share->share, Error(Error::kEngineIndexRebuilding), true);
   }
   Json::Value result;
-  AddTotalsAndWords(result, page.found);
+  AddTotalsAndWords(result, page.found, query.hints);
   result["next_offset"] = Json::Int64(page.next_offset);
   result["hits"] = Json::Value(Json::arrayValue);
   for (IndexHit& hit : page.found.hits) result["hits"].append(UserHitJson(scope, hit));

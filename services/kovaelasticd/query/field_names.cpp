@@ -20,10 +20,13 @@ struct ConditionName {
   ConditionType type;
 };
 constexpr ConditionName kConditionNames[] = {
-    {"name", ConditionType::kName},     {"kind", ConditionType::kKind}, {"ext", ConditionType::kExt},
-    {"filetype", ConditionType::kExt},  {"path", ConditionType::kPath}, {"in", ConditionType::kPath},
-    {"folder", ConditionType::kPath},   {"size", ConditionType::kSize}, {"date", ConditionType::kDate},
-    {"modified", ConditionType::kDate},
+    {"name", ConditionType::kName},     {"filename", ConditionType::kName}, {"kind", ConditionType::kKind},
+    {"ext", ConditionType::kExt},       {"extension", ConditionType::kExt}, {"filetype", ConditionType::kExt},
+    {"path", ConditionType::kPath},     {"in", ConditionType::kPath},       {"folder", ConditionType::kPath},
+    {"dir", ConditionType::kPath},      {"size", ConditionType::kSize},     {"date", ConditionType::kDate},
+    {"modified", ConditionType::kDate}, {"changed", ConditionType::kDate},  {"before", ConditionType::kBefore},
+    {"after", ConditionType::kAfter},   {"since", ConditionType::kAfter},   {"type", ConditionType::kType},
+    {"has", ConditionType::kHas},
 };
 
 /// A name that people give a field, and the fields that it looks into.
@@ -40,6 +43,7 @@ const FriendlyName kFriendlyNames[] = {
     {"genre", {names::kKOVAMDMusicalGenre}},
     {"subject", {names::kKOVAMDTitle, names::kKOVAMDHeadline}},
     {"from", {names::kKOVAMDAuthors, names::kKOVAMDAuthorAddresses}},
+    {"sender", {names::kKOVAMDAuthors, names::kKOVAMDAuthorAddresses}},
     {"to", {names::kKOVAMDRecipients, names::kKOVAMDRecipientAddresses}},
     {"person", {names::kKOVAMDPeopleDisplayName, names::kKOVAMDParticipants}},
     {"place", {names::kKOVAMDNamedLocation, names::kKOVAMDCity, names::kKOVAStateOrProvince, names::kKOVAMDCountry}},
@@ -51,6 +55,7 @@ const FriendlyName kFriendlyNames[] = {
     {"type", {names::kKOVAMDContentType}},
     {"keyword", {names::kKOVAMDKeywords, names::k_KOVAMDUserTags}},
     {"tag", {names::kKOVAMDKeywords, names::k_KOVAMDUserTags}},
+    {"tags", {names::kKOVAMDKeywords, names::k_KOVAMDUserTags}},
     {"comment", {names::kKOVAMDComment, names::kKOVAMDFinderComment}},
     {"description", {names::kKOVAMDDescription, names::kKOVAMDHeadline}},
     {"camera", {names::kKOVAMDAcquisitionMake, names::kKOVAMDAcquisitionModel}},
@@ -94,6 +99,12 @@ std::string NameOfFields(const std::vector<std::string>& fields) {
 }
 
 bool IsFullFieldName(std::string_view name) { return name.starts_with("KOVA") || name.starts_with("_KOVAMD"); }
+
+bool TakesRange(std::string_view name) {
+  const ConditionType type = ConditionTypeOf(name);
+  return type == ConditionType::kSize || type == ConditionType::kDate || type == ConditionType::kBefore ||
+         type == ConditionType::kAfter || FindRangeField(name) != nullptr;
+}
 
 bool IsFieldName(std::string_view name) {
   return ConditionTypeOf(name) != ConditionType::kNone || FindRangeField(name) != nullptr ||

@@ -10,7 +10,7 @@ namespace ferrox::engine {
 // are not.
 
 /// What a name stands for, apart from fields that are searched by words or ranges.
-enum class ConditionType { kNone, kName, kKind, kExt, kPath, kSize, kDate };
+enum class ConditionType { kNone, kName, kKind, kExt, kPath, kSize, kDate, kBefore, kAfter, kType, kHas };
 ConditionType ConditionTypeOf(std::string_view name);
 
 /// The document fields that a friendly name stands for; empty when it is none.
@@ -22,6 +22,9 @@ std::string NameOfFields(const std::vector<std::string>& fields);
 
 /// Whether the name is a document field's own.
 bool IsFullFieldName(std::string_view name);
+
+/// Whether the value is a range, which may be compared, and have blanks.
+bool TakesRange(std::string_view name);
 
 /// Whether the name is any that has a meaning before a ":".
 bool IsFieldName(std::string_view name);

@@ -1,9 +1,10 @@
 #include "services/kovaelasticd/query/field_start.h"
 
+#include <utility>
+
 #include "base/text.h"
 #include "services/kovaelasticd/query/field_names.h"
 #include "services/kovaelasticd/query/query_lexer.h"
-#include "services/kovaelasticd/query/query_values.h"
 
 namespace ferrox::engine {
 
@@ -21,15 +22,20 @@ size_t SkipBlanksFrom(std::string_view query, size_t at) {
   return at;
 }
 
-/// "size>1M": a field with a range, whose value begins at `at` with a sign.
-std::optional<FieldStart> ComparedField(std::string_view query, std::string name, size_t at) {
-  const bool has_sign = at < query.size() && (query[at] == '<' || query[at] == '>');
+/// Whether few texts can stand behind the name: what fits is hardly meant as text.
+bool TakesFewValues(std::string_view name) {
   const ConditionType type = ConditionTypeOf(name);
-  const bool has_range =
-      type == ConditionType::kSize || type == ConditionType::kDate || FindRangeField(name) != nullptr;
-  if (!has_sign || !has_range) return std::nullopt;
-  const size_t behind = at + (query.substr(at + 1, 1) == "=" ? 2 : 1);
-  return FieldStart{std::move(name), SkipBlanksFrom(query, behind), std::string(query.substr(at, behind - at)), false};
+  return TakesRange(name) || type == ConditionType::kKind;
+}
+
+/// "size>1M", "size=1M": a field with a range, whose value begins at `at` with a sign.
+std::optional<FieldStart> ComparedField(std::string_view query, std::string name, size_t at) {
+  if (at == query.size() || !TakesRange(name)) return std::nullopt;
+  const bool is_equal = query[at] == '=';
+  if (!is_equal && query[at] != '<' && query[at] != '>') return std::nullopt;
+  const size_t behind = at + (!is_equal && query.substr(at + 1, 1) == "=" ? 2 : 1);
+  std::string sign(is_equal ? "" : query.substr(at, behind - at));
+  return FieldStart{std::move(name), SkipBlanksFrom(query, behind), std::move(sign), false};
 }
 
 }  // namespace
@@ -44,9 +50,11 @@ std::optional<FieldStart> FieldAt(std::string_view query, size_t begin) {
   if (query.substr(value, 1) == ":") return std::nullopt;
   const bool apart = value == query.size() || IsQueryBlank(query[value]);
   if (!apart) return FieldStart{std::move(name), value, "", true};
-  if (IsCapital(name.front()) || query.find('\n') != std::string_view::npos) return std::nullopt;
+  const bool is_first = SkipBlanksFrom(query, 0) == begin;
+  if (IsCapital(name.front()) && !(is_first && TakesFewValues(name))) return std::nullopt;
+  if (query.find('\n') != std::string_view::npos) return std::nullopt;
   const size_t next = SkipBlanksFrom(query, value);
-  return FieldStart{std::move(name), next, "", next == query.size()};
+  return FieldStart{std::move(name), next, "", is_first && next == query.size()};
 }
 
 }  // namespace ferrox::engine

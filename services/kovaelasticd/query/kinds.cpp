@@ -13,10 +13,11 @@ struct KindName {
   const char* name;
   Kind kind;
 };
-constexpr KindName kKindNames[] = {{"document", kDocument}, {"doc", kDocument}, {"audio", kAudio},   {"music", kAudio},
-                                   {"video", kVideo},       {"movie", kVideo},  {"image", kImage},   {"photo", kImage},
-                                   {"picture", kImage},     {"other", kOther},  {"folder", kFolder}, {"dir", kFolder},
-                                   {"directory", kFolder}};
+constexpr KindName kKindNames[] = {
+    {"document", kDocument}, {"doc", kDocument}, {"audio", kAudio},     {"music", kAudio}, {"sound", kAudio},
+    {"song", kAudio},        {"video", kVideo},  {"movie", kVideo},     {"film", kVideo},  {"clip", kVideo},
+    {"image", kImage},       {"photo", kImage},  {"picture", kImage},   {"pic", kImage},   {"other", kOther},
+    {"folder", kFolder},     {"dir", kFolder},   {"directory", kFolder}};
 
 constexpr char kText[] = "txt text md markdown rst adoc asc log nfo org tex me readme";
 constexpr char kSpreadsheet[] = "xls xlsx xlsm xlsb xlt xltx ods ots fods csv tsv gnumeric numbers";
@@ -32,13 +33,16 @@ struct ExtensionsName {
   const char* name;
   const char* extensions;
 };
-constexpr ExtensionsName kExtensionsNames[] = {{"text", kText},         {"spreadsheet", kSpreadsheet},
-                                               {"sheet", kSpreadsheet}, {"presentation", kPresentation},
-                                               {"pdf", "pdf"},          {"slide", kPresentation},
-                                               {"ebook", kEbook},       {"book", kEbook},
-                                               {"mail", kMail},         {"email", kMail},
-                                               {"source", kSource},     {"code", kSource},
-                                               {"archive", kArchive}};
+constexpr ExtensionsName kExtensionsNames[] = {{"text", kText},          {"spreadsheet", kSpreadsheet},
+                                               {"sheet", kSpreadsheet},  {"table", kSpreadsheet},
+                                               {"excel", kSpreadsheet},  {"presentation", kPresentation},
+                                               {"slide", kPresentation}, {"powerpoint", kPresentation},
+                                               {"pdf", "pdf"},           {"ebook", kEbook},
+                                               {"book", kEbook},         {"mail", kMail},
+                                               {"email", kMail},         {"message", kMail},
+                                               {"source", kSource},      {"code", kSource},
+                                               {"script", kSource},      {"archive", kArchive},
+                                               {"zip", kArchive}};
 
 std::optional<NamedKind> FindExactly(const std::string& name) {
   for (const KindName& known : kKindNames) {
@@ -57,7 +61,8 @@ std::optional<NamedKind> FindKind(std::string_view name) {
   std::optional<NamedKind> found = FindExactly(lower);
   if (found.has_value() || !lower.ends_with('s')) return found;
   lower.pop_back();
-  return FindExactly(lower);
+  if (found = FindExactly(lower); found.has_value() || !lower.ends_with("ie")) return found;
+  return FindExactly(lower.substr(0, lower.size() - 2) + "y");
 }
 
 }  // namespace ferrox::engine

@@ -12,7 +12,7 @@ bool IsDigit(char c) { return c >= '0' && c <= '9'; }
 bool IsLetter(char c) { return (base::LowerAscii(c) >= 'a' && base::LowerAscii(c) <= 'z') || (c & 0x80) != 0; }
 
 bool HasDigit(const QueryNode& node) {
-  const bool plain = node.type == QueryNode::Type::kText && !node.phrase && !node.prefix;
+  const bool plain = node.type == QueryNode::Type::kText && !node.phrase && !node.prefix && !node.pattern;
   return plain && std::any_of(node.text.begin(), node.text.end(), &IsDigit);
 }
 

@@ -35,6 +35,7 @@ struct QueryNode {
   std::string text;  ///< as written, without quotes
   bool phrase = false;
   bool prefix = false;
+  bool pattern = false;   ///< of kText and kName: `text` has "*" and "?" as wildcards (Pattern)
   bool required = false;  ///< of kText: every hit must have it; else documents without it are found too, further behind
   /// Of a word that is the first of several neighbouring ones with digits, as "DE89" in "DE89 3704 0044": all of them,
   /// as they stand in the query. They may be one number or code, which documents have grouped otherwise. The others
@@ -47,7 +48,7 @@ struct QueryNode {
   int64_t high = std::numeric_limits<int64_t>::max();
 };
 
-/// The longest query, in bytes.
+/// So many bytes of a query are read.
 constexpr size_t kQueryMaxBytes = 4096;
 /// The most conditions in one, apart from plain words, and the deepest parentheses. A group in parentheses is one, too.
 constexpr size_t kQueryMaxTerms = 64;

@@ -9,7 +9,10 @@
 #include "common/error.h"
 #include "services/kovaelasticd/query/field_names.h"
 #include "services/kovaelasticd/query/kinds.h"
+#include "services/kovaelasticd/query/query_dates.h"
+#include "services/kovaelasticd/query/query_text.h"
 #include "services/kovaelasticd/query/query_values.h"
+#include "services/kovaelasticd/query/query_words.h"
 #include "services/kovaelasticd/text/schema.h"
 #include "services/kovaelasticd/text/words.h"
 #include "wire/fields.h"
@@ -32,28 +35,13 @@ QueryNode OnlyOr(QueryNode either) {
   return only;
 }
 
-bool IsAsciiAlnum(char c) {
-  const char lower = base::LowerAscii(c);
-  return (lower >= 'a' && lower <= 'z') || (c >= '0' && c <= '9');
+QueryNode ExtensionNode(std::string extension) {
+  QueryNode node(QueryNode::Type::kExt);
+  node.text = std::move(extension);
+  return node;
 }
 
-/// Of a single word with "*" or "?" within it what stands before the first of them; "" for anything else.
-std::string_view BeforeWildcard(std::string_view word) {
-  word = word.substr(0, word.find_last_not_of("*?") + 1);  // those of "what??" are punctuation
-  const size_t at = word.find_first_of("*?");
-  if (at == std::string_view::npos || (word.front() >= '0' && word.front() <= '9')) return {};
-  const bool plain = std::all_of(word.begin(), word.end(),
-                                 [](char c) { return IsAsciiAlnum(c) || c == '*' || c == '?' || (c & 0x80) != 0; });
-  return plain ? word.substr(0, at) : std::string_view();
-}
-
-/// The extension in "*.pdf"; "" for anything else.
-std::string_view ExtensionAsked(const ConditionValue& value) {
-  const std::string_view text = value.text;
-  const bool is_one = !value.phrase && !value.prefix && text.size() > 2 && text.starts_with("*.") &&
-                      std::all_of(text.begin() + 2, text.end(), &IsAsciiAlnum);
-  return is_one ? text.substr(2) : std::string_view();
-}
+std::string Quoted(const std::string& text) { return "\"" + text + "\""; }
 
 }  // namespace
 
@@ -70,41 +58,40 @@ void ConditionReader::Hint(const std::string& sentence) const {
   hints_->push_back(sentence);
 }
 
-/// The index knows words by their beginnings, and names by any part of them: of "rep*t" the beginning is looked for.
+/// The words of fields are known by their beginnings: of "rep*t" that is looked for.
 ConditionValue ConditionReader::WithoutWildcards(QueryNode::Type type, ConditionValue value) const {
   const size_t begin = value.text.find_first_not_of('*');
-  if (begin == std::string::npos) {
-    value.text.clear();
-  } else if (begin > 0) {
-    value.text.erase(0, begin);
-    const bool needless = type == QueryNode::Type::kName || !IsAsciiAlnum(value.text.front());
-    if (!needless) {
-      Hint("a \"*\" can stand only at the end of a word; names are found by any part of them: name:" + value.text);
-    }
-  }
+  value.text.erase(0, std::min(begin, value.text.size()));
   const std::string before(BeforeWildcard(value.text));
-  if (before.size() < 2) return value;
-  Hint("a \"*\" or \"?\" within a word is not known; what is looked for begins with " + before);
+  if (type != QueryNode::Type::kField || before.size() < 2) return value;
+  Hint(Quoted(value.text) + " is looked for as " + before + "*: of fields, only name: takes a \"*\" within a word");
   value.text = before;
   value.prefix = true;
   return value;
 }
 
 /// A node for words; one that asks for nothing when there is no letter or digit in them.
-QueryNode ConditionReader::Words(QueryNode::Type type, const ConditionValue& given) const {
-  const std::string extension(ExtensionAsked(given));
-  if (type == QueryNode::Type::kText && !extension.empty()) {
-    QueryNode node(QueryNode::Type::kExt);
-    node.text = base::LowerAscii(extension);
-    return node;
+QueryNode ConditionReader::Words(QueryNode::Type type, const ConditionValue& given, bool is_pasted) const {
+  const bool is_text = type == QueryNode::Type::kText;
+  QueryNode node(type);
+  if (!given.phrase && !is_pasted) {
+    QueryNode either(QueryNode::Type::kOr);
+    for (const std::string& extension : is_text ? ExtensionsAsked(given.text) : std::vector<std::string>()) {
+      either.children.push_back(ExtensionNode(extension));
+    }
+    if (!either.children.empty()) return OnlyOr(std::move(either));
+    node.text = type == QueryNode::Type::kField ? "" : PatternAsked(given.text + (given.prefix ? "*" : ""));
+    node.pattern = node.required = !node.text.empty();
+    if (node.pattern) return node;
   }
-  const ConditionValue value = given.phrase ? given : WithoutWildcards(type, given);
+  ConditionValue value = given.phrase ? given : WithoutWildcards(type, given);
+  if (is_text && !value.phrase) value.text.erase(0, SchemeBytes(value.text));
   const QueryWords words = SplitQueryText(value.text, value.prefix);
   if (words.words.empty()) return QueryNode(QueryNode::Type::kAll);
   if (value.prefix && words.words.back().size() < 2) {
-    Refuse(value.begin, "the beginning of a word must have two letters at least; add some before the \"*\"");
+    Hint(Quoted(value.text + "*") + " is looked for as " + value.text + ": a beginning must have two letters at least");
+    value.prefix = false;
   }
-  QueryNode node(type);
   node.text = value.text;
   node.phrase = value.phrase;
   node.prefix = value.prefix;
@@ -112,6 +99,10 @@ QueryNode ConditionReader::Words(QueryNode::Type type, const ConditionValue& giv
 }
 
 QueryNode ConditionReader::Field(const std::string& name, size_t begin, const ConditionValue& value) const {
+  if (TakesRange(name)) {
+    if (std::optional<QueryNode> range = Range(name, value)) return std::move(*range);
+    RefuseRange(name, value);
+  }
   switch (ConditionTypeOf(name)) {
     case ConditionType::kName:
       return Words(QueryNode::Type::kName, value);
@@ -121,15 +112,13 @@ QueryNode ConditionReader::Field(const std::string& name, size_t begin, const Co
       return Extensions(value);
     case ConditionType::kPath:
       return Path(value);
-    case ConditionType::kSize:
-      return Size(value);
-    case ConditionType::kDate:
-      return Date(value);
-    case ConditionType::kNone:
-      break;
+    case ConditionType::kType:
+      return Type(name, begin, value);
+    case ConditionType::kHas:
+      return Has(value);
+    default:
+      return WordsInField(name, begin, value);
   }
-  const RangeField* range = FindRangeField(name);
-  return range != nullptr ? Number(*range, value) : WordsInField(name, begin, value);
 }
 
 QueryNode ConditionReader::WordsInField(const std::string& name, size_t begin, const ConditionValue& value) const {
@@ -165,82 +154,138 @@ QueryNode ConditionReader::Kinds(const ConditionValue& value) const {
   QueryNode either(QueryNode::Type::kOr);
   for (const std::string& part : Parts(value)) {
     const std::optional<NamedKind> kind = FindKind(part);
-    if (!kind.has_value()) Refuse(value.begin, "there is no kind \"" + part + "\"; known are " + kKnownKinds);
+    const std::string lower = base::LowerAscii(part);
+    if (lower == "file" || lower == "files") {
+      kinds.kinds.insert(kinds.kinds.end(), {kDocument, kAudio, kVideo, kImage, kOther});
+      continue;
+    }
+    if (!kind.has_value()) {
+      Refuse(value.begin, "there is no kind " + Quoted(part) + "; write ext:" + lower +
+                              " for files whose name ends so, or one of these kinds: " + kKnownKinds);
+    }
     if (kind->kind.has_value()) {
       kinds.kinds.push_back(*kind->kind);
       continue;
     }
     std::istringstream extensions{std::string(kind->extensions)};
-    for (std::string extension; extensions >> extension;) {
-      either.children.emplace_back(QueryNode::Type::kExt).text = extension;
-    }
+    for (std::string extension; extensions >> extension;) either.children.push_back(ExtensionNode(extension));
   }
   if (either.children.empty()) return kinds;
   if (!kinds.kinds.empty()) either.children.push_back(std::move(kinds));
   return OnlyOr(std::move(either));
 }
 
+/// "type:application/pdf" is the field's; "type:image" and "type:pdf" may be a kind or an extension.
+QueryNode ConditionReader::Type(const std::string& name, size_t begin, const ConditionValue& value) const {
+  if (FindKind(value.text).has_value()) return Kinds(value);
+  QueryNode in_field = WordsInField(name, begin, value);
+  const bool is_word = value.text.find_first_not_of("abcdefghijklmnopqrstuvwxyz0123456789") == std::string::npos;
+  if (in_field.type != QueryNode::Type::kField || value.phrase || value.prefix || !is_word) return in_field;
+  QueryNode either(QueryNode::Type::kOr);
+  either.children.push_back(ExtensionNode(value.text));
+  either.children.push_back(std::move(in_field));
+  return either;
+}
+
+/// What is attached is part of a mail's text, and not told from it.
+QueryNode ConditionReader::Has(const ConditionValue& value) const {
+  const std::string what = base::LowerAscii(value.text);
+  if (!what.starts_with("attach")) {
+    Refuse(value.begin, "has:" + value.text + " is not known; there is has:attachment");
+  }
+  Hint("which mail has files attached is not known; all mail is looked through, with the text of such files");
+  ConditionValue mail = value;
+  mail.text = "mail";
+  return Kinds(mail);
+}
+
 QueryNode ConditionReader::Extensions(const ConditionValue& value) const {
   QueryNode either(QueryNode::Type::kOr);
   for (const std::string& part : Parts(value)) {
-    QueryNode node(QueryNode::Type::kExt);
-    node.text = base::LowerAscii(part.front() == '.' ? part.substr(1) : part);
-    either.children.push_back(std::move(node));
+    const size_t begin = part.find_first_not_of("*.");
+    if (begin == std::string::npos) Refuse(value.begin, Quoted(part) + " is no extension; write ext:pdf");
+    either.children.push_back(ExtensionNode(base::LowerAscii(part.substr(begin))));
   }
   return OnlyOr(std::move(either));
 }
 
 /// The parts of "a,b,c".
 std::vector<std::string> ConditionReader::Parts(const ConditionValue& value) const {
-  std::vector<std::string> parts(1);
-  for (const char c : value.text) {
-    if (c == ',') {
-      parts.emplace_back();
-    } else {
-      parts.back() += c;
-    }
+  std::vector<std::string> parts;
+  for (size_t begin = 0; begin < value.text.size();) {
+    const size_t end = std::min(value.text.size(), value.text.find_first_of(",;| ", begin));
+    if (end > begin) parts.push_back(value.text.substr(begin, end - begin));
+    begin = end + 1;
   }
-  const bool hole = std::any_of(parts.begin(), parts.end(), [](const std::string& part) { return part.empty(); });
-  if (hole) Refuse(value.begin, "there is nothing beside a \",\"; remove it");
+  if (parts.empty()) Refuse(value.begin, "there is nothing but signs in " + Quoted(value.text) + "; give a word");
   return parts;
 }
 
+/// "/photo/2024", "photo/2024", "\\server\photo"; "/photo/*.jpg" is a folder and a name.
 QueryNode ConditionReader::Path(const ConditionValue& value) const {
-  if (value.text.front() != '/') {
-    Refuse(value.begin, "a folder is given by its full path, such as path:/volume1/photo; begin it with /");
+  std::string path = PlaceOfAddress(value.text);
+  if (path.empty()) path = value.text;
+  std::replace(path.begin(), path.end(), path.find('/') == path.npos ? '\\' : '/', '/');
+  const bool is_full = path.starts_with('/');
+  if (!is_full && (!value.certain || path.starts_with('~') || path.starts_with('.') || path.find(':') != path.npos)) {
+    Refuse(value.begin, Quoted(value.text) +
+                            " is no folder; write a share and its folders, such as path:/photo/2024, "
+                            "or the full path");
   }
+  if (!is_full) path.insert(0, "/");
+  const size_t last = path.rfind('/') + 1;
+  const size_t wildcard = path.find_first_of("*?");
   QueryNode node(QueryNode::Type::kPath);
-  node.text = value.text;
+  if (wildcard < last) {
+    Refuse(value.begin, "a \"*\" or \"?\" can stand only behind the last \"/\" of " + Quoted(value.text) +
+                            "; write path:/photo name:IMG_*");
+  }
+  const bool has_name = value.prefix ? last < path.size() : wildcard != path.npos;
+  node.text = has_name ? path.substr(0, last) : path;
   while (!node.text.empty() && node.text.back() == '/') node.text.pop_back();
+  if (!has_name) return node;
+  ConditionValue name = value;
+  name.text = path.substr(last);
+  QueryNode both(QueryNode::Type::kAnd);
+  both.children.push_back(std::move(node));
+  both.children.push_back(Words(QueryNode::Type::kName, name));
+  return both;
+}
+
+/// "before:2024" and "after:2024" leave the year itself out, "since:2024" does not.
+std::optional<QueryNode> ConditionReader::Range(const std::string& name, const ConditionValue& value) const {
+  const ConditionType type = ConditionTypeOf(name);
+  const RangeField* field = FindRangeField(name);
+  std::string text = value.text;
+  if (type == ConditionType::kBefore) text.insert(0, "<");
+  if (type == ConditionType::kAfter) text.insert(0, base::LowerAscii(name.front()) == 'a' ? ">" : ">=");
+  const std::optional<ValueRange> range = type == ConditionType::kSize ? ParseSizeRange(text)
+                                          : field != nullptr           ? field->parse(text, now_)
+                                                                       : ParseDateRange(text, now_);
+  if (!range.has_value()) return std::nullopt;
+  QueryNode node = RangeNode(type == ConditionType::kSize ? QueryNode::Type::kSize
+                             : field != nullptr           ? QueryNode::Type::kRange
+                                                          : QueryNode::Type::kDate,
+                             *range);
+  if (field != nullptr) node.fields = field->fields;
   return node;
 }
 
-QueryNode ConditionReader::Size(const ConditionValue& value) const {
-  const std::optional<ValueRange> range = ParseSizeRange(value.text);
-  if (!range.has_value()) {
-    Refuse(value.begin, "\"" + value.text + "\" is no size; write size:>10M, size:1k..2M or size:700");
+void ConditionReader::RefuseRange(const std::string& name, const ConditionValue& value) const {
+  if (const RangeField* field = FindRangeField(name); field != nullptr) {
+    Refuse(value.begin, Quoted(value.text) + " does not fit; write " + field->example);
   }
-  return RangeNode(QueryNode::Type::kSize, *range);
+  if (ConditionTypeOf(name) == ConditionType::kSize) {
+    Refuse(value.begin, Quoted(value.text) + " is no size; write size:>10M, size:1k..2M or size:700");
+  }
+  const bool has_slashes = std::count(value.text.begin(), value.text.end(), '/') == 2;
+  Refuse(value.begin, has_slashes
+                          ? Quoted(value.text) + " may be read in two ways; write the year first, as in date:2024-03-31"
+                          : Quoted(value.text) +
+                                " is no date; write date:2024-03-31, date:2024-01..2024-06, "
+                                "date:>2024-01-31, date:7d for the last 7 days, or date:today");
 }
 
-QueryNode ConditionReader::Date(const ConditionValue& value) const {
-  const std::optional<ValueRange> range = ParseDateRange(value.text, now_);
-  if (!range.has_value()) {
-    Refuse(value.begin, "\"" + value.text +
-                            "\" is no date; write date:2024, date:2024-01..2024-06, date:>2024-01-31, date:7d or "
-                            "date:today");
-  }
-  return RangeNode(QueryNode::Type::kDate, *range);
-}
-
-QueryNode ConditionReader::Number(const RangeField& field, const ConditionValue& value) const {
-  const std::optional<ValueRange> range = field.parse(value.text, now_);
-  if (!range.has_value()) {
-    Refuse(value.begin, "\"" + value.text + "\" does not fit; write " + field.example);
-  }
-  QueryNode node = RangeNode(QueryNode::Type::kRange, *range);
-  node.fields = field.fields;
-  return node;
-}
+bool ConditionReader::IsKind(const std::string& word) { return FindKind(word).has_value(); }
 
 }  // namespace ferrox::engine

@@ -6,23 +6,16 @@
 #include <string_view>
 #include <vector>
 
+#include "services/kovaelasticd/query/value_range.h"
+
 namespace ferrox::engine {
 
 // The values of conditions: sizes, dates, durations, users and groups. All of them read what stands behind "name:" and
 // answer with nothing where they cannot; ConditionReader makes a sentence of that.
 
-/// A range of numbers, both ends included.
-struct ValueRange {
-  int64_t low;
-  int64_t high;
-};
-
-/// ">10M", "<=2k", "1k..2M", "..5G", "700": bytes. Nothing when the text is no size.
+/// ">10M", "<=2k", "1k..2M", "1-5MB", "..5G", "700": bytes. One size with a unit, "5M", has room for what is rounded to
+/// it. Nothing when the text is no size.
 std::optional<ValueRange> ParseSizeRange(std::string_view text);
-
-/// "2024", "2024-01..2024-06", ">2024-01-01", "7d", "today": seconds since the epoch, by local time. `now` is in the
-/// same measure. Nothing when the text is no date.
-std::optional<ValueRange> ParseDateRange(std::string_view text, int64_t now);
 
 /// Fields that hold a number, and how a range of them is written.
 struct RangeField {

@@ -7,6 +7,7 @@
 #include "fileindex/util.h"
 #include "services/kovaelasticd/search/folder_words.h"
 #include "services/kovaelasticd/search/path_condition.h"
+#include "services/kovaelasticd/search/pattern_search.h"
 #include "services/kovaelasticd/store/document.h"
 #include "services/kovaelasticd/store/store_rows.h"
 #include "services/kovaelasticd/store/work_limit.h"
@@ -18,6 +19,11 @@ namespace {
 
 /// A condition is checked document by document when there are no more of them.
 constexpr int64_t kCheckOneByOneMax = 2000;
+/// Of the words that a pattern stands for: how many are one expression, so many hits of visible documents end it, and
+/// so many of the words are marked in snippets.
+constexpr ptrdiff_t kWordsAtOnce = 32;
+constexpr int64_t kPatternHitsMax = 2000000;
+constexpr size_t kPatternMarksMax = 64;
 
 bool IsWords(QueryNode::Type type) {
   return type == QueryNode::Type::kText || type == QueryNode::Type::kField || type == QueryNode::Type::kName;
@@ -231,6 +237,7 @@ bool QueryEvaluator::MatchesFilter(int64_t id, const QueryNode& filter) {
 /// into names. A plain word is also looked for within names, by its groups of three characters; and in other forms and
 /// in the names of folders above, unless it is behind a NOT.
 DocSet QueryEvaluator::EvaluateWords(const QueryNode& node, bool ranking) {
+  if (node.pattern) return EvaluatePattern(node, ranking);
   TermCollector found(database_, visible_, ranking ? hits_max_ : 0);
   const std::vector<WordForm> forms = FormsOf(node, ranking, constants_);
   found.Collect(forms);
@@ -252,6 +259,47 @@ DocSet QueryEvaluator::EvaluateWords(const QueryNode& node, bool ranking) {
     NoteWords(node);
   }
   return all;
+}
+
+/// What matches in names, and for kText words of texts.
+DocSet QueryEvaluator::EvaluatePattern(const QueryNode& node, bool ranking) {
+  TermCollector found(database_, visible_, ranking ? hits_max_ : 0);
+  const Pattern pattern(node.text);
+  found.AddNamed(DocumentsNamedLike(reader_, visible_, pattern));
+  if (node.type == QueryNode::Type::kText) CollectWordsLike(pattern, node.text, ranking, found);
+  if (ranking) {
+    RankedWord& word = found_words_.ranked.emplace_back(RankedWord{pattern.Folded()});
+    word.letters = CountLetters(word.word);
+    word.documents = found.Documents();
+    word.rarity = Rarity(visible_.Documents(), word.documents);
+    word.hits = found.TakeHits();
+  }
+  return found.Set();
+}
+
+void QueryEvaluator::CollectWordsLike(const Pattern& pattern, const std::string& typed, bool ranking,
+                                      TermCollector& found) {
+  const WordsLike like = FindWordsLike(reader_, visible_, pattern);
+  const auto hint = [&](const std::string& sentence) { found_words_.hints.push_back("\"" + typed + "\" " + sentence); };
+  if (!like.is_known) return hint("was looked for in names alone: the words of this index are not at hand");
+  size_t at = 0;
+  while (at < like.words.size() && found.Seen() < kPatternHitsMax) {
+    WorkLimit::Check();
+    const auto begin = like.words.begin() + static_cast<ptrdiff_t>(at);
+    const auto end = begin + std::min<ptrdiff_t>(kWordsAtOnce, like.words.end() - begin);
+    at = static_cast<size_t>(end - like.words.begin());
+    found.Collect(FormOfAny({begin, end}));
+    if (!ranking) continue;
+    for (auto word = begin; word != end && found_words_.marked.size() < kPatternMarksMax; ++word) {
+      found_words_.marked.push_back({*word, false});
+    }
+  }
+  if (like.has_more || at < like.words.size()) {
+    hint("stands for too many words; the " + std::to_string(at) +
+         " shortest were looked for in texts: give more letters");
+  } else if (!CanBeWord(pattern) && typed.find('.') == typed.npos) {
+    hint("was looked for in names alone; in texts a pattern is one word, with three letters at least, such as rep*t");
+  }
 }
 
 void QueryEvaluator::NoteWords(const QueryNode& node) {

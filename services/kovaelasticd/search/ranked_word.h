@@ -31,6 +31,7 @@ struct FoundWords {
   std::vector<RankedWord> ranked;       ///< in the order of the query, the required ones first
   std::vector<std::string> looked_for;  ///< folded, for other spellings
   std::vector<SnippetWord> marked;      ///< for snippets
+  std::vector<std::string> hints = {};  ///< as in SearchReply
 };
 
 /// What one of `all` documents has the more, the fewer others have it.

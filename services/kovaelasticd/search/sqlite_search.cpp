@@ -75,6 +75,7 @@ SearchReply Searcher::Run() {
   reply.ignored = std::move(found.ignored);
   reply.repaired = std::move(found.repaired);
   reply.none_has_all = found.none_has_all;
+  reply.hints = evaluator.Words().hints;
   PutPage(found, evaluator.Words(), reply);
   if (reply.total == 0) {
     const std::vector<std::string>& words = evaluator.Words().looked_for;

@@ -68,6 +68,14 @@ void TermCollector::CollectNameParts(const std::string& text) {
   by_name_parts_.UniteWith(parts.Set());
 }
 
+void TermCollector::AddNamed(const DocSet& documents) {
+  HitCollector named(hits_max_, visible_);
+  documents.ForEach([&named](int64_t id) { return named.Add(id, 0, kInName); });
+  WorkLimit::Check();
+  Merge(named.TakeHits(), [](TermHit& hit, const WordHit& found) { hit.places |= found.places; });
+  by_name_parts_.UniteWith(documents);
+}
+
 void TermCollector::AddRepaired(const TermCollector& other, double likelihood, const RankingConstants& constants) {
   Merge(other.hits_, [&](TermHit& hit, const TermHit& found) {
     const bool is_new = hit.exact == 0 && hit.stems == 0 && hit.places == 0 && hit.other_places == 0 && hit.other == 0;

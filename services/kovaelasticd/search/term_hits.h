@@ -50,6 +50,8 @@ class TermCollector {
   }
   /// Documents that have the text within a word of their name; they do not count for Documents, nor stop anything.
   void CollectNameParts(const std::string& text);
+  /// Documents whose name is one that is looked for; they count as those by parts of names do.
+  void AddNamed(const DocSet& documents);
   /// What another word, of which this one is a misspelling, was found in, by a share of its worth.
   void AddRepaired(const TermCollector& other, double likelihood, const RankingConstants& constants);
 
@@ -57,6 +59,8 @@ class TermCollector {
   int64_t Documents() const;
   /// All documents, those by parts of the name too.
   DocSet Set() const;
+  /// How often a visible document came, for one word or another.
+  int64_t Seen() const { return collector_.SeenVisible(); }
   /// In ascending order.
   std::vector<TermHit> TakeHits() { return std::move(hits_); }
 

@@ -96,6 +96,12 @@ std::vector<WordForm> FormsOf(const std::string& word, const RankingConstants& c
   return forms;
 }
 
+WordForm FormOfAny(const std::vector<std::string>& words) {
+  std::string any;
+  for (const std::string& word : words) any += (any.empty() ? "" : " OR ") + PhraseExpression({word}, false);
+  return TextForm(WordForm::Kind::kExact, "(" + any + ")", false, 1);
+}
+
 std::vector<std::string> PhrasesOf(const std::vector<WordForm>& forms) {
   std::vector<std::string> phrases;
   for (const WordForm& form : forms) {

@@ -30,6 +30,9 @@ std::vector<WordForm> SpellingForms(const std::string& word, const RankingConsta
 /// The forms of a word that is looked for in place of another one.
 std::vector<WordForm> FormsOf(const std::string& word, const RankingConstants& constants);
 
+/// Any of these words, as they are.
+WordForm FormOfAny(const std::vector<std::string>& words);
+
 /// The expressions that find these forms in texts, but for beginnings of words.
 std::vector<std::string> PhrasesOf(const std::vector<WordForm>& forms);
 

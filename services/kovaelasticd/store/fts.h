@@ -45,6 +45,7 @@ class HitCollector {
   bool Add(int64_t id, uint8_t count, uint8_t places) {
     if (++seen_ % kLookEvery == 0 && WorkLimit::IsOver()) return false;
     if (!visible_.Contains(id)) return true;
+    ++seen_visible_;
     if (!set_.Contains(id)) {
       set_.Add(id);
       if (++documents_ > documents_max_) return false;
@@ -60,6 +61,7 @@ class HitCollector {
   int64_t Documents() const { return documents_; }
   /// How often Add was called: the work that it was.
   size_t Seen() const { return seen_; }
+  int64_t SeenVisible() const { return seen_visible_; }
   DocSet TakeSet() { return std::move(set_); }
   /// Those since the last call, in ascending order of documents; those of several phrases follow each other.
   std::vector<WordHit> TakeHits();
@@ -73,6 +75,7 @@ class HitCollector {
   const size_t hits_max_;
   size_t shorten_at_;
   size_t seen_ = 0;
+  int64_t seen_visible_ = 0;
   int64_t documents_ = 0;
   int64_t documents_max_ = std::numeric_limits<int64_t>::max();
   const Visible& visible_;

@@ -127,6 +127,7 @@ struct SearchReply {
   std::vector<SearchHit> hits;           ///< from the first, offset + limit of them at most
   std::vector<std::string> suggestions;  ///< other spellings, when nothing was found
   std::vector<Completion> completions;   ///< where it was no search
+  std::vector<std::string> hints = {};   ///< sentences about what was looked for otherwise than it may be meant
 };
 
 /// Figures of an index; those of documents are as of its last commit.

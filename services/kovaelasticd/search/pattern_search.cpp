@@ -1,0 +1,109 @@
+#include "services/kovaelasticd/search/pattern_search.h"
+
+#include <algorithm>
+#include <cstdint>
+#include <memory>
+#include <optional>
+#include <string_view>
+#include <utility>
+
+#include "services/kovaelasticd/search/word_forms.h"
+#include "services/kovaelasticd/store/fts.h"
+#include "services/kovaelasticd/store/word_list.h"
+#include "services/kovaelasticd/store/work_limit.h"
+#include "services/kovaelasticd/text/fold.h"
+
+namespace ferrox::engine {
+
+namespace {
+
+/// Names of up to so many documents, as a part of all, are read by their rows: a pass over the index of names costs
+/// less for more.
+constexpr int64_t kByRowPart = 16;
+constexpr int64_t kByRowAlways = 1000;
+/// The work limit is looked at so often.
+constexpr uint64_t kLookEvery = 1024;
+/// Letters that a pattern of words gives: of fewer, most words of an index would have to be looked at.
+constexpr size_t kGivenLettersMin = 3;
+
+/// The documents with all parts of the pattern in their names; nothing where it has none that are long enough.
+std::optional<DocSet> WithParts(StoreReader& reader, const Visible& visible, const Pattern& pattern) {
+  std::optional<DocSet> with;
+  for (const std::string& part : pattern.Parts()) {
+    HitCollector found(0, visible);
+    // Groups of one part stand one behind the other.
+    Collect(reader.database, "meta_fts", NamePartExpression(part), false, found);
+    if (with.has_value()) {
+      with->IntersectWith(found.Set());
+    } else {
+      with = found.TakeSet();
+    }
+  }
+  return with;
+}
+
+bool HasVisible(StoreReader& reader, const Visible& visible, const std::string& word) {
+  HitCollector first(0, visible);
+  first.StopAfter(0);
+  const WordForm form = FormOfAny({word});
+  Collect(reader.database, "content_fts", form.content, false, first);
+  if (!first.HasStopped()) Collect(reader.database, "meta_fts", form.meta, false, first);
+  return first.HasStopped();
+}
+
+}  // namespace
+
+DocSet DocumentsNamedLike(StoreReader& reader, const Visible& visible, const Pattern& pattern) {
+  DocSet named;
+  uint64_t looked = 0;
+  const auto look = [&](int64_t id, std::string_view name) {
+    if (++looked % kLookEvery == 0) WorkLimit::Check();
+    if (pattern.MatchesName(FoldText(name))) named.Add(id);
+  };
+  const std::optional<DocSet> with_parts = WithParts(reader, visible, pattern);
+  if (with_parts.has_value() && with_parts->Count() <= std::max(kByRowAlways, visible.Documents() / kByRowPart)) {
+    Statement row = reader.database.Prepare("SELECT name FROM docs WHERE id = ?1");
+    with_parts->ForEach([&](int64_t id) {
+      row.Reset();
+      if (row.Bind(1, id).Step()) look(id, row.Text(0));
+      return true;
+    });
+    return named;
+  }
+  for (Statement rows = reader.database.Prepare("SELECT id, name FROM docs"); rows.Step();) {
+    const int64_t id = rows.Int(0);
+    if (with_parts.has_value() ? with_parts->Contains(id) : visible.Contains(id)) look(id, rows.Text(1));
+  }
+  return named;
+}
+
+bool CanBeWord(const Pattern& pattern) {
+  const std::string& letters = pattern.Folded();
+  const auto given =
+      std::count_if(letters.begin(), letters.end(), [](char c) { return c != '*' && c != '?' && (c & 0xC0) != 0x80; });
+  return pattern.IsOfLetters() && static_cast<size_t>(given) >= kGivenLettersMin;
+}
+
+WordsLike FindWordsLike(StoreReader& reader, const Visible& visible, const Pattern& pattern) {
+  WordsLike like;
+  if (!CanBeWord(pattern)) return like;
+  const std::shared_ptr<const WordList> known = reader.words.Load(reader.database, visible.Version());
+  like.is_known = known != nullptr;
+  if (!like.is_known) return like;
+  std::vector<std::string> matching;
+  known->ForEachBeginning(pattern.Beginning(), [&](std::string_view word, bool /*in_several*/) {
+    // Only who sees all sees each of them, and needs no more.
+    const bool enough = !visible.IsForAsker() && matching.size() > WordsLike::kMost;
+    if (!enough && pattern.MatchesWord(word)) matching.emplace_back(word);
+  });
+  for (std::string& word : matching) {
+    WorkLimit::Check();
+    if (visible.IsForAsker() && !HasVisible(reader, visible, word)) continue;
+    like.has_more = like.words.size() == WordsLike::kMost;
+    if (like.has_more) break;
+    like.words.push_back(std::move(word));
+  }
+  return like;
+}
+
+}  // namespace ferrox::engine
