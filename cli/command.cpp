@@ -153,8 +153,11 @@ Arguments ParseArguments(const Command& command, const std::vector<std::string>&
   }
   if (arguments.Has(kHelpOption.name)) return arguments;
   CheckWords(command, arguments.words);
+  const bool is_replaced = std::any_of(command.options.begin(), command.options.end(), [&](const Option& option) {
+    return option.replaces_needed && arguments.Has(option.name);
+  });
   for (const Option& option : command.options) {
-    if (!option.is_needed || arguments.Has(option.name)) continue;
+    if (!option.is_needed || is_replaced || arguments.Has(option.name)) continue;
     throw UsageError(std::string(option.name) + " is missing: " + option.help + "\nExample: " + ExampleOf(command));
   }
   return arguments;

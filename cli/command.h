@@ -66,7 +66,8 @@ struct Option {
   /// gives it.
   const char* value;
   const char* help;
-  bool is_needed = false;  ///< the command cannot do without it
+  bool is_needed = false;        ///< the command cannot do without it
+  bool replaces_needed = false;  ///< with it, the command can
 };
 
 /// What was given to a command, sorted by ParseArguments.

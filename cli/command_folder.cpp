@@ -14,6 +14,7 @@
 #include "cli/configuration_change.h"
 #include "cli/escape.h"
 #include "cli/explain.h"
+#include "cli/folder_exclusions.h"
 #include "cli/folder_path.h"
 #include "cli/format.h"
 #include "cli/kinds.h"
@@ -51,18 +52,18 @@ Json::Value ToArray(const std::vector<std::string>& paths) {
 }
 
 /// The stored form of each folder: what is given, and of an entry that is there already the rest.
-Json::Value FolderEntries(const Arguments& arguments, const std::vector<std::string>& paths, const Kinds& kinds,
-                          const FolderMgr& configured) {
+Json::Value FolderEntries(const Arguments& arguments, const std::vector<std::string>& paths,
+                          const std::optional<Kinds>& kinds, const FolderMgr& configured) {
   if (arguments.Has("--name") && paths.size() != 1) throw UsageError("--name goes with one folder at a time");
   Json::Value list(Json::arrayValue);
   for (const std::string& path : paths) {
     const std::string name = arguments.Get("--name", Basename(path));
-    Json::Value entry = fileindex::Folder(path, name, false, false, false, false, false, false).GetData();
+    Json::Value entry = fileindex::Folder(path, name, true, true, true, true, false, false).GetData();
     for (const auto& folder : configured.GetFolders()) {
       if (folder->GetPath() == path) entry = folder->GetData();
     }
     if (arguments.Has("--name")) entry["name"] = name;
-    kinds.Store(entry);
+    if (kinds.has_value()) kinds->Store(entry);
     list.append(entry);
   }
   return list;
@@ -113,15 +114,15 @@ int PreviewFolders(const Arguments& arguments, const Kinds& kinds) {
 
 /// Adds or changes folders with one call of the library, so that all of them are changed or none. The engine is asked
 /// first, since the index of a new share is made before the folders file is saved.
-int Upsert(const Arguments& arguments, const Kinds& kinds, void (*upsert)(const Json::Value&, bool)) {
+int Upsert(const Arguments& arguments, const std::optional<Kinds>& kinds, void (*upsert)(const Json::Value&, bool)) {
   const FolderMgr configured;
   const std::vector<std::string> paths = SharePaths(arguments, configured);
   RequireNoFiles(paths);
   const Json::Value list = FolderEntries(arguments, paths, kinds, configured);
   RequireEngine();
-  ChangeConfiguration([&] { upsert(list, false); });
-  for (const std::string& path : paths) {
-    (void)printf("%s: %s\n", EscapeForTerminal(path).c_str(), kinds.Text().c_str());
+  ChangeWithPatterns(arguments, paths, [&] { ChangeConfiguration([&] { upsert(list, false); }); });
+  for (const Json::Value& entry : list) {
+    (void)printf("%s: %s\n", EscapeForTerminal(TextOf(entry, "path")).c_str(), Kinds(entry).Text().c_str());
   }
   (void)printf("indexing has begun; 'fileindexctl status' shows how far it is\n");
   return kDone;
@@ -136,10 +137,11 @@ std::string FolderText(const Json::Value& folder) {
   if (folder["paused"].asBool()) text += ", paused";
   const std::string volume = TextOf(folder, "volume_to_be_clean");
   if (!volume.empty() && folder["paused"].asBool()) text += " with the volume " + EscapeForTerminal(volume);
-  if (!folder["additional"].isObject()) return text + "\n";
+  if (!folder["additional"].isObject()) return text + "\n" + PatternText(folder);
   const Json::Value& status = folder["additional"]["status"];
   text += ", " + TextOf(status, "text");
-  return text + (TextOf(status, "desc").empty() ? "" : " (" + TextOf(status, "desc") + ")") + "\n";
+  return text + (TextOf(status, "desc").empty() ? "" : " (" + TextOf(status, "desc") + ")") + "\n" +
+         PatternText(folder);
 }
 
 /// The library leaves folders out of a page whose state it cannot find out. Here they stay, without it, and standard
@@ -177,9 +179,12 @@ int RunFolderAdd(const Arguments& arguments) {
   return IsDryRun(arguments) ? PreviewFolders(arguments, kinds) : Upsert(arguments, kinds, &fileindex::FolderAdd);
 }
 
-/// A change without --kinds would switch all kinds on, which is hardly meant: it is an option that is needed.
+/// A change without --kinds would switch all kinds on, which is hardly meant: it is an option that is needed,
+/// unless the patterns are changed.
 int RunFolderSet(const Arguments& arguments) {
-  return Upsert(arguments, Kinds(arguments.Get("--kinds")), &fileindex::FolderSet);
+  std::optional<Kinds> kinds;
+  if (arguments.Has("--kinds")) kinds.emplace(arguments.Get("--kinds"));
+  return Upsert(arguments, kinds, &fileindex::FolderSet);
 }
 
 /// Both daemons are needed: without them the index or the worker of a share would stay behind.
@@ -215,6 +220,10 @@ int RunFolderReindex(const Arguments& arguments) {
 int RunFolderGet(const Arguments& arguments) {
   Json::Value folder;
   fileindex::FolderGet(folder, ToSharePath(arguments.words[0], FolderMgr()));
+  Json::Value alone(Json::arrayValue);
+  alone.append(folder);
+  AddPatterns(alone);
+  folder = alone[0];
   if (arguments.Has("--json")) {
     PrintJson(folder);
   } else {
@@ -245,6 +254,7 @@ int RunFolderList(const Arguments& arguments) {
     list(with_states, additional);
     is_complete = AddStates(page["folder"], with_states["folder"]);
   }
+  AddPatterns(page["folder"]);
   const bool none = UintOf(page, "total") == 0;
   const int done = is_complete ? kDone : kIncomplete;
   if (arguments.Has("--json")) {

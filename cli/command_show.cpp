@@ -101,6 +101,19 @@ Json::Value StatusOfIndexDaemon() try {
   return Json::Value();
 }
 
+/// Ignore files of the share that are not followed.
+void ListRefusedPatterns(const Json::Value& daemon, const std::string& share, bool json) {
+  const Json::Value entry = ShareIn(daemon, share);
+  for (const Json::Value& file : entry["refused_patterns"]) {
+    if (json) {
+      PrintJson(file);
+    } else {
+      (void)printf("%s\n    its patterns are not followed: %s\n", EscapeForTerminal(TextOf(file, "path")).c_str(),
+                   EscapeForTerminal(TextOf(file, "reason")).c_str());
+    }
+  }
+}
+
 /// Folders of the share that are no part of its index, unless another share has them. Nothing when no daemon tells.
 uint64_t ListLeftOut(const Json::Value& daemon, const std::string& share, bool json) {
   uint64_t count = 0;
@@ -144,6 +157,7 @@ int RunUnread(const Arguments& arguments) {
       (void)left_out.AddIfRebuilding(share);
     });
     folders += ListLeftOut(daemon, share, arguments.Has("--json"));
+    ListRefusedPatterns(daemon, share, arguments.Has("--json"));
   }
   FlushOutput();
   (void)fprintf(stderr, "%s files could not be read, or only in part\n", Count(count).c_str());

@@ -1,5 +1,6 @@
 #include "cli/command_table.h"
 
+#include "cli/folder_exclusions.h"
 #include "cli/share_commands.h"
 #include "cli/user_commands.h"
 
@@ -31,6 +32,12 @@ CommandGroup ServiceCommands() {
                &RunStatus,
                Needs::kReading,
                &RunUserStatus},
+              {"config show",
+               "",
+               {kJson},
+               "Shows which files are left out of all indexed folders, or are indexed by name only.",
+               &RunConfigShow,
+               Needs::kReading},
               {"pause",
                "[HOURS]",
                {},
@@ -83,25 +90,25 @@ CommandGroup Searching() {
       }};
 }
 
+std::vector<Option> WithExclusions(std::vector<Option> options) {
+  for (const Option& option : ExclusionOptions()) options.push_back(option);
+  return options;
+}
+
 /// Of single folders.
 std::vector<Command> FolderCommands() {
   const Option kinds = {"--kinds", "KINDS", "document, audio, video, photo, joined with commas; or all, or none"};
   Option needed_kinds = kinds;
   needed_kinds.is_needed = true;
   return {
-      {"folder add",
-       "PATH...",
-       {kinds, kName, kDryRun, kDryRunJson},
+      {"folder add", "PATH...", WithExclusions({kinds, kName, kDryRun, kDryRunJson}),
        "Indexes folders, with the content of all kinds of files unless --kinds says otherwise. Adds all of the folders "
        "or none.",
-       &RunFolderAdd,
-       Needs::kShares},
-      {"folder set",
-       "PATH...",
-       {needed_kinds, kName},
-       "Changes which kinds of files are read in folders. Adds folders that are not indexed yet.",
-       &RunFolderSet,
-       Needs::kShares},
+       &RunFolderAdd, Needs::kShares},
+      {"folder set", "PATH...", WithExclusions({needed_kinds, kName}),
+       "Changes which kinds of files are read in folders, and which files are left out. Adds folders that are not "
+       "indexed yet.",
+       &RunFolderSet, Needs::kShares},
       {"folder delete", "PATH...", {}, "Stops indexing folders. The files stay.", &RunFolderDelete, Needs::kShares},
       {"folder reindex",
        "PATH...",

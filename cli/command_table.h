@@ -32,6 +32,7 @@ int RunUp(const Arguments& arguments);
 int RunDown(const Arguments& arguments);
 int RunPrepare(const Arguments& arguments);
 int RunStatus(const Arguments& arguments);
+int RunConfigShow(const Arguments& arguments);
 int RunPause(const Arguments& arguments);
 int RunResume(const Arguments& arguments);
 

@@ -113,6 +113,10 @@ void PrintMissing(const Json::Value& share) {
     (void)printf("    left out: %s: %s\n", EscapeForTerminal(TextOf(folder, "path")).c_str(),
                  EscapeForTerminal(TextOf(folder, "reason")).c_str());
   }
+  for (const Json::Value& file : share["refused_patterns"]) {
+    (void)printf("    not followed: %s: %s\n", EscapeForTerminal(TextOf(file, "path")).c_str(),
+                 EscapeForTerminal(TextOf(file, "reason")).c_str());
+  }
   Json::Value counts(Json::objectValue);
   Json::Value examples(Json::objectValue);
   for (const auto& reason : share["failures"].getMemberNames()) {

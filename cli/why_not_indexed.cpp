@@ -14,6 +14,7 @@
 #include "cli/ask.h"
 #include "cli/command.h"
 #include "cli/configuration_change.h"
+#include "cli/excluded.h"
 #include "cli/format.h"
 #include "cli/kinds.h"
 #include "cli/share_place.h"
@@ -62,6 +63,8 @@ std::string WhyNotBySettings(const std::string& path, const std::string& share, 
     const std::string folder = is_folder ? path : Dirname(path);
     return "it lies in no indexed folder; 'fileindexctl folder add " + folder + "' indexes its folder";
   }
+  const std::string excluded = ExclusionText(WhyExcluded(share, path), path);
+  if (!excluded.empty()) return excluded;
   return IsPaused(share) ? "share " + share + " is paused; 'fileindexctl share resume " + share + "' resumes it" : "";
 }
 
@@ -138,9 +141,10 @@ std::string WhyNotIndexed(const std::string& path, const std::string& share) {
 std::string WhyNameOnly(const std::string& path) {
   const std::string kind = KindNameOf(path);
   const fileindex::FolderMgr configured;
-  if (kind.empty() || !configured.IsFullPathIndexed(path)) return "";
   const auto folder = configured.GetMostSuitableCfg(path);
   if (folder == nullptr) return "";
+  const std::string excluded = ExclusionText(WhyExcluded(folder->GetShare(), path), path);
+  if (!excluded.empty() || kind.empty()) return excluded;
   return "the content of " + kind + " files is not indexed in " + folder->GetPath() +
          "; 'fileindexctl folder set' changes that";
 }

@@ -36,6 +36,8 @@ inline constexpr char kElasticdFolder[] = "/var/lib/kova/kovaelasticd";
 /// The indexed folders and the states of indexing; each is written under its lock file below.
 inline constexpr char kConfigurationFolder[] = "/var/packages/Ferrox/etc";
 inline constexpr char kFileIndexFoldersCfgPath[] = "/var/packages/Ferrox/etc/fileindex.folders";
+/// Which files are left out of indexed folders; beside the folders, under the lock of these.
+inline constexpr char kFileIndexExclusionsCfgPath[] = "/var/packages/Ferrox/etc/fileindex.exclusions";
 inline constexpr char kFileIndexStatusCfgPath[] = "/var/packages/Ferrox/etc/fileindex.status";
 inline constexpr char kFolderLockPath[] = "/tmp/ferrox_cfg_folder.lock";
 inline constexpr char kStatusLockPath[] = "/tmp/ferrox_cfg_fi_status.lock";

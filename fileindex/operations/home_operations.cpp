@@ -15,6 +15,7 @@
 #include "common/log.h"
 #include "common/sdk_mutex.h"
 #include "fileindex/folders/folder_mgr.h"
+#include "fileindex/operations/folder_patterns.h"
 #include "fileindex/operations/index_mgr.h"
 #include "fileindex/operations/operation_steps.h"
 #include "fileindex/queue/custom_event.h"
@@ -101,7 +102,7 @@ void UserRename(const std::string& user_from, const std::string& user_to) {
         folder->GetPath().c_str());
   }
   OperationSteps steps(__func__);
-  AddSaveStep(steps, folder_mgr);
+  AddSaveStep(steps, folder_mgr, [&] { CopyFolderPatterns(home_from, home_to); });
   steps.Add("queue the rename of " + user_from, {Subject::kUser, user_from},
             [&] { AddCustomEvent(EVENT_RENAME, GetFullPath(home_to), GetFullPath(home_from), Json::Value()); });
   steps.Run();

@@ -9,6 +9,7 @@
 
 #include "common/log.h"
 #include "fileindex/folders/folder_mgr.h"
+#include "fileindex/operations/folder_patterns.h"
 #include "fileindex/operations/related_services.h"
 
 namespace ferrox::fileindex {
@@ -40,8 +41,12 @@ OperationError OperationSteps::Stopped(size_t first, const Error& failure) const
   return stopped;
 }
 
-void AddSaveStep(OperationSteps& steps, const FolderMgr& folder_mgr) {
-  steps.Add("save the folders", {Subject::kFolders, ""}, [&folder_mgr] { folder_mgr.Save(); });
+void AddSaveStep(OperationSteps& steps, const FolderMgr& folder_mgr, const std::function<void()>& before) {
+  steps.Add("save the folders", {Subject::kFolders, ""}, [&folder_mgr, before] {
+    before();
+    folder_mgr.Save();
+    DropFolderPatterns(folder_mgr);
+  });
 }
 
 void AddWatchStep(OperationSteps& steps, const std::string& share, const FolderMgr& folder_mgr) {

@@ -40,8 +40,9 @@ class OperationSteps {
 
 // Steps that several operations take. What is passed must live until the steps are run.
 
-/// FolderMgr::Save.
-void AddSaveStep(OperationSteps& steps, const FolderMgr& folder_mgr);
+/// FolderMgr::Save, with `before` in front of it; the patterns of folders that are gone go, too.
+void AddSaveStep(
+    OperationSteps& steps, const FolderMgr& folder_mgr, const std::function<void()>& before = [] {});
 /// UpsertKOVANotifydCfg.
 void AddWatchStep(OperationSteps& steps, const std::string& share, const FolderMgr& folder_mgr);
 /// SetupRelatedServices(false), when no folder is left.

@@ -11,6 +11,7 @@
 #include "fileindex/elastic/elastic_control.h"
 #include "fileindex/folders/folder_mgr.h"
 #include "fileindex/folders/folder_share.h"
+#include "fileindex/operations/folder_patterns.h"
 #include "fileindex/operations/index_mgr.h"
 #include "fileindex/operations/operation_steps.h"
 #include "fileindex/operations/related_services.h"
@@ -68,7 +69,7 @@ void ShareRename(const std::string& share_from, const std::string& share_to) {
     if (IsOfShare(*folder, share_from)) folder->SetShare(share_to);
   }
   OperationSteps steps(__func__);
-  AddSaveStep(steps, folder_mgr);
+  AddSaveStep(steps, folder_mgr, [&] { CopyFolderPatterns("/" + share_from, "/" + share_to); });
   steps.AddOfShare("rename the index of", share_from,
                    [&] { elastic::ShareIndexRename(share_from, share_to, sdk::SDKShare(share_to).GetDBPath()); });
   steps.AddOfShare("queue the rename of", share_from, [&] {

@@ -36,6 +36,12 @@ bool ReadWeb(const Json::Value& object, Configuration::Web& web) {
   return object.isObject() && ReadMember(object, "addresses", web.addresses) && ReadMember(object, "hosts", web.hosts);
 }
 
+bool ReadExclusions(const Json::Value& object, Configuration::Exclusions& exclusions) {
+  return object.isObject() && ReadMember(object, "defaults", exclusions.defaults) &&
+         ReadMember(object, "exclude", exclusions.lists.exclude) &&
+         ReadMember(object, "exclude_content", exclusions.lists.exclude_content);
+}
+
 Configuration Load(const std::string& path) {
   Configuration configuration;
   configuration.samba.config = InstanceRoot() + "/etc/samba/smb.conf";
@@ -47,6 +53,7 @@ Configuration Load(const std::string& path) {
   const bool read = value.isObject() && ReadMember(value, "admin_group", configuration.admin_group) &&
                     ReadMember(value, "trusted_clients", configuration.trusted_clients) &&
                     ReadMember(value, "least_user", configuration.least_user) &&
+                    (!value.isMember("exclusions") || ReadExclusions(value["exclusions"], configuration.exclusions)) &&
                     (!value.isMember("samba") || ReadSamba(value["samba"], configuration.samba)) &&
                     (!value.isMember("notifyd") || ReadNotifyd(value["notifyd"], configuration.notifyd)) &&
                     (!value.isMember("web") || ReadWeb(value["web"], configuration.web));

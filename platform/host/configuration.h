@@ -5,6 +5,8 @@
 #include <string>
 #include <vector>
 
+#include "base/pattern_lists.h"
+
 /// What the host's administrator may set: the JSON object in "/etc/kova/kova.json" below the instance's root.
 ///   {"admin_group": "sudo", "samba": {"shares": true}}
 namespace kova::host {
@@ -31,6 +33,11 @@ struct Configuration {
   /// Users whose programs may search for others, and the least uid that they may search for.
   std::vector<std::string> trusted_clients = {};
   uint32_t least_user = 1000;
+  /// What is left out of all indexed folders (platform/host/exclusion_settings.h).
+  struct Exclusions {
+    bool defaults = true;  ///< the built-in patterns count
+    base::PatternLists lists = {};
+  } exclusions = {};
   std::string problem = {};  ///< why the file cannot be used, for people; empty when it can
 };
 

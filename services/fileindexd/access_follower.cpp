@@ -46,7 +46,8 @@ std::set<std::string> AccessFollower::PathsOf(const AttributeChanges& changes) {
   std::set<uint64_t> files = changes.files;
   for (const std::string& path : changes.paths) {
     struct stat status = {};
-    if (!base::IsAtOrBelow(path, context_.root) || PresenceOf(path, status) != Presence::kThere) continue;
+    if (!base::IsAtOrBelow(path, context_.root) || context_.exclusions.LeavesOutAll(path)) continue;
+    if (PresenceOf(path, status) != Presence::kThere) continue;
     if (S_ISREG(status.st_mode) && status.st_nlink > 1) files.insert(status.st_ino);
     paths.insert(path);
   }

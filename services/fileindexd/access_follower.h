@@ -10,6 +10,7 @@
 #include "services/fileindexd/queue_tail.h"
 #include "services/fileindexd/repeating_thread.h"
 #include "services/fileindexd/share_index.h"
+#include "services/support/exclusions.h"
 
 namespace ferrox::indexd {
 
@@ -22,6 +23,7 @@ class AccessFollower {
   struct Context {
     const std::string& root;  ///< the share's folder
     const std::string& queue_path;
+    services::Exclusions& exclusions;
     ShareIndex& index;
     DocumentWriter& writer;
     Anchors& anchors;

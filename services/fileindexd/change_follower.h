@@ -23,6 +23,7 @@ class ChangeFollower {
     const std::string& share;
     const std::string& root;  ///< the share's folder
     const ShareFolders& folders;
+    services::Exclusions& exclusions;
     const std::string& queue_path;
     DocumentWriter& writer;
     TaskPool& pool;

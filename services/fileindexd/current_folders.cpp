@@ -5,7 +5,7 @@
 namespace ferrox::indexd {
 
 ShareFolders CurrentFolders::Load() {
-  ShareFolders folders = ShareFolders::Load(share_, root_);
+  ShareFolders folders = ShareFolders::Load(share_, root_, patterns_());
   const base::MutexLock lock(mutex_);
   last_ = std::make_shared<const ShareFolders>(folders);
   return folders;

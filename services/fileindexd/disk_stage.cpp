@@ -56,6 +56,13 @@ void DiskStage::CarryOut(fileindex::FileIndexOP op, const std::string& path, con
   for (const Handler& handler : kHandlers) {
     if (handler.op == op) (this->*handler.run)(path, old_path);
   }
+  FollowIgnoreFile(path);
+  if (op == fileindex::OP_RENAME) FollowIgnoreFile(old_path);
+}
+
+/// What it says now holds for all below its folder. A folder's owner may have become that of the file in it.
+void DiskStage::FollowIgnoreFile(const std::string& path) {
+  if (base::NameOf(path) == services::kIgnoreFileName) comparer_.CompareOnce(std::string(base::ParentOf(path)));
 }
 
 /// What is there again is compared: of a file that a folder has replaced, the queue keeps the delete alone. A reindex
@@ -81,7 +88,7 @@ void DiskStage::Attr(const std::string& path, const std::string&) {
   const Place place = rules_.PlaceOf(path, is_folder);
   if (place == Place::kOutside) {
     tasks_.Submit([this, path] { writer_.Remove(path); });
-  } else if (is_folder && !reads_all_folders_ && BecameReadable(path)) {
+  } else if (is_folder && (HasIgnoreFile(path) || (!reads_all_folders_ && BecameReadable(path)))) {
     comparer_.Compare(path);
   } else if (place == Place::kIndexed) {
     access_.Add(path);
@@ -115,6 +122,12 @@ void DiskStage::Reindex(const std::string& path, const std::string&) {
 void DiskStage::FullReindex(const std::string&, const std::string&) {
   had_reindex_ = true;
   comparer_.Compare(context_.share.root);
+}
+
+/// Then the folder's owner decides whether that file counts.
+bool DiskStage::HasIgnoreFile(const std::string& folder) {
+  struct stat status = {};
+  return lstat((folder + "/" + services::kIgnoreFileName).c_str(), &status) == 0;
 }
 
 /// Whether this is a folder that can be read and of which the index knows no content: its permissions may just have

@@ -54,6 +54,8 @@ class DiskStage {
   void Rename(const std::string& path, const std::string& old_path);
   void Reindex(const std::string& path, const std::string& old_path);
   void FullReindex(const std::string& path, const std::string& old_path);
+  void FollowIgnoreFile(const std::string& path);
+  static bool HasIgnoreFile(const std::string& folder);
   bool BecameReadable(const std::string& folder) const;
 
   const PassContext& context_;

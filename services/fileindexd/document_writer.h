@@ -13,6 +13,7 @@
 #include "services/fileindexd/share_folders.h"
 #include "services/fileindexd/share_index.h"
 #include "services/fileindexd/share_status.h"
+#include "services/support/exclusions.h"
 
 namespace ferrox::indexd {
 
@@ -22,8 +23,8 @@ namespace ferrox::indexd {
 class DocumentWriter {
  public:
   /// All outlive it.
-  DocumentWriter(ShareIndex& index, const ShareFolders& folders, ShareStatus& status)
-      : index_(index), folders_(folders), status_(status), access_(index, status) {}
+  DocumentWriter(ShareIndex& index, const ShareFolders& folders, services::Exclusions& exclusions, ShareStatus& status)
+      : index_(index), folders_(folders), exclusions_(exclusions), status_(status), access_(index, status) {}
 
   /// Whether the document needs nothing: it has the stamp of the file's present state and a record of its rights, and
   /// holds its content exactly when that is wanted and as well as the present readers can read it.
@@ -70,6 +71,7 @@ class DocumentWriter {
 
   ShareIndex& index_;
   const ShareFolders& folders_;
+  services::Exclusions& exclusions_;
   ShareStatus& status_;
   AccessRecorder access_;
   std::atomic<bool> uncommitted_{false};

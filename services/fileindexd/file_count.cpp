@@ -28,8 +28,9 @@ base::OpenFolderPtr OpenFolder(const std::string& path, dev_t& device) {
 
 }  // namespace
 
-FileCount::FileCount(const std::string& folder, const ShareFolders& folders, ShareStatus& status)
-    : folders_(folders), status_(status), thread_([this, folder] { Count(folder); }) {}
+FileCount::FileCount(const std::string& folder, const ShareFolders& folders, services::Exclusions& exclusions,
+                     ShareStatus& status)
+    : folders_(folders), exclusions_(exclusions), status_(status), thread_([this, folder] { Count(folder); }) {}
 
 FileCount::~FileCount() {
   stop_.Request();
@@ -49,9 +50,13 @@ void FileCount::Count(const std::string& folder) {
     if (first) root_device = device;
     if (device != root_device || folders_.IsInInner(path)) continue;
     const bool indexed = folders_.PlaceOf(path) == ShareFolders::Place::kIndexed;
+    const auto exclusions = exclusions_.In(path);
     while (const dirent* entry = readdir(dir.get())) {
       const std::string name = entry->d_name;
       if (name == "." || name == ".." || entry->d_type == DT_LNK || PathRules::SkipName(name)) continue;
+      const bool is_folder = entry->d_type == DT_DIR;
+      const bool left_out = exclusions->Of(name, is_folder) == services::Exclusion::kLeftOut;
+      if (left_out && !(is_folder && exclusions_.Of(path + "/" + name, true) == services::Exclusion::kNone)) continue;
       const auto place = indexed ? ShareFolders::Place::kIndexed : folders_.PlaceOf(path + "/" + name);
       if (place == ShareFolders::Place::kIndexed) ++files;
       if (place != ShareFolders::Place::kOutside && entry->d_type == DT_DIR) waiting.push_back(path + "/" + name);

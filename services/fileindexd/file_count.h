@@ -6,6 +6,7 @@
 #include "services/fileindexd/interruption.h"
 #include "services/fileindexd/share_folders.h"
 #include "services/fileindexd/share_status.h"
+#include "services/support/exclusions.h"
 
 namespace ferrox::indexd {
 
@@ -14,8 +15,9 @@ namespace ferrox::indexd {
 /// ahead of the comparison; the rules that need a look at each file are left out.
 class FileCount {
  public:
-  /// `folders` and `status` outlive it.
-  FileCount(const std::string& folder, const ShareFolders& folders, ShareStatus& status);
+  /// All but `folder` outlive it.
+  FileCount(const std::string& folder, const ShareFolders& folders, services::Exclusions& exclusions,
+            ShareStatus& status);
   FileCount(const FileCount&) = delete;
   FileCount& operator=(const FileCount&) = delete;
   ~FileCount();
@@ -24,6 +26,7 @@ class FileCount {
   void Count(const std::string& folder);
 
   const ShareFolders& folders_;
+  services::Exclusions& exclusions_;
   ShareStatus& status_;
   Interruption stop_;
   std::thread thread_;

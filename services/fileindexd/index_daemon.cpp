@@ -29,6 +29,7 @@ constexpr char kStopping[] = "the index daemon is being stopped; start it with '
 std::vector<std::string> FilesOf(const IndexDaemon::Options& options) {
   std::vector<std::string> files = options.share_files;
   files.push_back(InstancePath(kFileIndexFoldersCfgPath));
+  files.push_back(InstancePath(kFileIndexExclusionsCfgPath));
   return files;
 }
 
@@ -82,6 +83,7 @@ IndexDaemon::IndexDaemon(const Options& options)
     : pool_(ThreadsFor(options.workers)),
       workers_([this, options](const std::string& share) {
         WorkerEnvironment environment{pool_, pause_};
+        environment.instance_patterns = options.instance_patterns;
         environment.is_mount_point = options.is_mount_point;
         environment.mounts_below = options.mounts_below;
         environment.describe_share = options.describe_share;

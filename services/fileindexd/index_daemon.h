@@ -29,6 +29,8 @@ class IndexDaemon {
   static constexpr unsigned kRequestThreads = kSyncsMax + 4;
 
   struct Options {
+    /// The patterns of what is left out of all folders (CurrentFolders).
+    CurrentFolders::InstancePatterns instance_patterns = [] { return ShareFolders::InstancePatterns(); };
     /// Threads that read files, for all shares together; 0: one for each processor.
     unsigned workers = 0;
     /// Files that change when shares do; without them that is noticed at intervals.

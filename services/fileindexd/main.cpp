@@ -9,7 +9,9 @@
 
 #include <kova/log.h>
 
+#include "common/error.h"
 #include "common/paths.h"
+#include "platform/host/exclusion_settings.h"
 #include "platform/host/mounts.h"
 #include "platform/host/samba_shares.h"
 #include "platform/host/share_search.h"
@@ -49,6 +51,14 @@ std::optional<ferrox::wire::IndexShare> DescribeShare(const std::string& share) 
   return ferrox::wire::IndexShare{share, found.root, found.refused, found.rules};
 }
 
+/// Rather than to index what was to be left out, nothing is indexed while the settings cannot be read.
+ferrox::indexd::ShareFolders::InstancePatterns InstancePatterns() {
+  ferrox::indexd::ShareFolders::InstancePatterns found;
+  const std::string problem = kova::host::InstanceExclusions(found);
+  if (!problem.empty()) throw ferrox::Error(ferrox::Error::kLoadFailed, problem);
+  return found;
+}
+
 }  // namespace
 
 int main(int argc, char** argv) try {
@@ -64,6 +74,7 @@ int main(int argc, char** argv) try {
   options.share_files = kova::host::FilesOfShares();
   options.on_share_change = &kova::host::ExpectSambaChange;
   options.describe_share = &DescribeShare;
+  options.instance_patterns = &InstancePatterns;
   options.is_mount_point = &kova::host::IsMountRoot;
   options.mounts_below = &kova::host::MountsBelow;
   ferrox::indexd::IndexDaemon index_daemon(options);

@@ -17,18 +17,21 @@ namespace {
 /// in front of those of other shares.
 constexpr uint64_t kUrgentOperations = 4;
 
+/// One that is left out itself counts nevertheless.
+bool IsIgnoreFile(const std::string& path) { return base::NameOf(path) == services::kIgnoreFileName; }
+
 }  // namespace
 
 OperationRunner::OperationRunner(const PassContext& context)
     : context_(context),
-      rules_(context.share.share, context.share.root, context.folders),
-      writer_(context.index, context.folders, context.share.status),
+      rules_(context.share.share, context.share.root, context.folders, context.exclusions),
+      writer_(context.index, context.folders, context.exclusions, context.share.status),
       early_writes_before_(context.early_writes),
       anchors_(context.share.root, context.folders, writer_),
-      changes_({context.share.share, context.share.root, context.folders, context.share.queue.Path(), writer_,
-                context.share.environment.pool, context.share.interruption,
+      changes_({context.share.share, context.share.root, context.folders, context.exclusions,
+                context.share.queue.Path(), writer_, context.share.environment.pool, context.share.interruption,
                 context.share.environment.early_write_interval}),
-      access_({context.share.root, context.share.queue.Path(), context.index, writer_, anchors_,
+      access_({context.share.root, context.share.queue.Path(), context.exclusions, context.index, writer_, anchors_,
                context.share.interruption, context.share.environment.early_write_interval}),
       commits_(writer_, anchors_, changes_, access_),
       moves_(context_, rules_, writer_),
@@ -89,6 +92,11 @@ void OperationRunner::CarryOut(const fileindex::OP& op, Stage stage) {
   // The queue also has the changes in indexed shares that lie in this one; those have queues of their own.
   const bool is_inner = context_.folders.IsInInner(path);
   if (is_inner && (op.op != fileindex::OP_RENAME || context_.folders.IsInInner(op.path))) return;
+  if (op.op == fileindex::OP_DELETE) context_.share.status.PatternFilesGone(path);
+  if (op.op == fileindex::OP_RENAME) context_.share.status.PatternFilesGone(op.path);
+  // In a folder that is left out, a program may change thousands of files a second.
+  const bool is_excluded = rules_.IsExcluded(path) && !IsIgnoreFile(path);
+  if (is_excluded && (op.op != fileindex::OP_RENAME || rules_.IsExcluded(op.path))) return;
   if (op.op == fileindex::OP_RENAME && stage == Stage::kMove) AwaitOwner(path, op.path);
   stage == Stage::kMove ? moves_.CarryOut(op.op, path, op.path) : disk_.CarryOut(op.op, path, op.path);
   commits_.CommitIfDue();

@@ -9,6 +9,7 @@
 #include "services/fileindexd/share_folders.h"
 #include "services/fileindexd/share_index.h"
 #include "services/fileindexd/share_place.h"
+#include "services/support/exclusions.h"
 
 namespace ferrox::indexd {
 
@@ -16,6 +17,7 @@ namespace ferrox::indexd {
 struct PassContext {
   ShareContext& share;
   const ShareFolders& folders;  ///< as they were when the queue was detached
+  services::Exclusions& exclusions;
   ShareIndex& index;
   const HeldFolder& held;  ///< the share's folder
   /// Inode numbers of files that changed under names that say nothing of the share's own names of them.

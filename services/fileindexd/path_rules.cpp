@@ -43,20 +43,32 @@ std::string ShareProblem(const std::string& share, const std::string& root) {
   return "";
 }
 
-PathRules::PathRules(const std::string& share, const std::string& root, const ShareFolders& folders)
-    : share_(share), root_(root), folders_(folders) {}
+PathRules::PathRules(const std::string& share, const std::string& root, const ShareFolders& folders,
+                     services::Exclusions& exclusions)
+    : share_(share), root_(root), folders_(folders), exclusions_(exclusions) {}
 
 bool PathRules::SkipName(const std::string& name) { return fileindex::IsSystemPreservedFileName(name); }
 
 PathRules::Place PathRules::PlaceOf(const std::string& path) {
-  if (folders_.PlaceOf(path) == Place::kOutside) return Place::kOutside;
+  if (folders_.PlaceOf(path) == Place::kOutside || IsExcluded(path)) return Place::kOutside;
   struct stat status = {};
   return PlaceOf(path, lstat(path.c_str(), &status) == 0 && S_ISDIR(status.st_mode));
 }
 
 PathRules::Place PathRules::PlaceOf(const std::string& path, bool is_folder) {
-  const Place place = folders_.PlaceOf(path);
+  const Place place = PlaceByPatterns(path, is_folder);
   return place == Place::kOutside || IsLeftOut(path, is_folder) ? Place::kOutside : place;
+}
+
+/// Of what is left out by patterns, a folder may be on the way to one that is indexed by itself.
+PathRules::Place PathRules::PlaceByPatterns(const std::string& path, bool is_folder) {
+  const Place place = folders_.PlaceOf(path);
+  if (place != Place::kIndexed || !exclusions_.LeavesOut(path, is_folder)) return place;
+  return is_folder && folders_.HasBelow(path) ? Place::kOnTheWay : Place::kOutside;
+}
+
+bool PathRules::IsExcluded(const std::string& path) {
+  return folders_.PlaceOf(path) == Place::kIndexed && exclusions_.LeavesOutAll(path) && !folders_.HasBelow(path);
 }
 
 bool PathRules::IsLeftOut(const std::string& path, bool is_folder) {

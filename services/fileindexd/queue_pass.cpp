@@ -40,7 +40,10 @@ bool QueuePass::Run() {
   // The files of an inner share that is being renamed would be read for this one, too.
   if (folders.MissInnerOf(context_.applied.Get())) AwaitOtherFolders(folders);
   const std::set<uint64_t> changed_files = ChangedNumbersIn(context_.queue.DetachedPath());
-  OperationRunner runner({context_, folders, keeper_.Index(), held_, changed_files, keeper_.MayHoldStrays(),
+  services::Exclusions exclusions(
+      context_.root, folders.Exclusions(),
+      [this](const std::string& path, const std::string& reason) { context_.status.PatternFileRead(path, reason); });
+  OperationRunner runner({context_, folders, exclusions, keeper_.Index(), held_, changed_files, keeper_.MayHoldStrays(),
                           [&] { AwaitOtherFolders(folders); }, early_writes_});
   CarryOut(runner, folders, changed_files.size() > kChangedNumbersMax);
   // What went away in the meantime, with its volume for example, looked as if it had been deleted.

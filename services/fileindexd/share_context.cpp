@@ -10,7 +10,7 @@ ShareContext::ShareContext(const std::string& share_name, const WorkerEnvironmen
       root(sdk::SDKShare(share).GetPath()),
       environment(worker_environment),
       queue(sdk::SDKShare(share).GetQueuePath()),
-      folders(share, root),
+      folders(share, root, environment.instance_patterns),
       applied(fileindex::AppliedFoldersPath(queue.Path())),
       watch({queue.Path()}) {}
 

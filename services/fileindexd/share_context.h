@@ -34,6 +34,8 @@ struct WorkerEnvironment {
   /// While a management operation goes on, an index may be missing or paused for a moment, or the event of a rename be
   /// missing. What takes longer than this was not finished, and the worker puts it right.
   std::chrono::milliseconds patience = std::chrono::seconds(5);
+  /// What is left out of all folders.
+  CurrentFolders::InstancePatterns instance_patterns = [] { return ShareFolders::InstancePatterns(); };
   IsMountPoint is_mount_point = &NothingMounted;
   MountsBelow mounts_below = &NoMounts;
   /// What the engine is told of a share.

@@ -39,9 +39,9 @@ void ShareRound::PrepareIndexAndQueue() {
       retry_.HasFailedFor(Error::kEngineNoSuchIndex, context_.environment.patience, steady_clock::now()));
   keeper_.TellShare();
   keeper_.FollowRebuilding();
-  // No event says that indexed shares in this one came or went; a pass compares their folders.
+  // No event says that indexed shares in this one came or went, or that patterns changed; a pass compares the folders.
   const bool is_queued = context_.queue.HasLines() || context_.queue.IsDetached();
-  if (!is_queued && folders.DiffersInInnerAlone(context_.applied.Get())) {
+  if (!is_queued && folders.DiffersWithoutEvent(context_.applied.Get())) {
     (void)context_.queue.Add(kPassEvent, context_.root);
   }
 }
@@ -81,7 +81,7 @@ bool ShareRound::AwaitsEvent() {
   const ShareFolders folders = context_.folders.Load();
   const std::vector<std::string> differing = folders.DifferingFrom(context_.applied.Get());
   const bool strays = keeper_.HoldsStrays();
-  if (!strays && folders.DiffersInInnerAlone(context_.applied.Get())) return true;  // since this round began
+  if (!strays && folders.DiffersWithoutEvent(context_.applied.Get())) return true;  // since this round began
   if (!strays && differing.empty()) {
     awaits_event_since_.reset();
     return false;

@@ -1,12 +1,16 @@
 #include "services/fileindexd/share_status.h"
 
 #include <chrono>
+#include <cstddef>
 
+#include "base/path.h"
 #include "common/clock.h"
 
 namespace ferrox::indexd {
 
 namespace {
+
+constexpr size_t kRefusedPatternsKept = 100;
 
 const char* StateName(ShareStatus::State state) {
   constexpr const char* kNames[] = {"starting",
@@ -96,6 +100,20 @@ void ShareStatus::AddFailure(const std::string& reason, const std::string& path)
   failures_.Add(reason, path);
 }
 
+void ShareStatus::PatternFileRead(const std::string& path, const std::string& reason) {
+  const base::MutexLock lock(mutex_);
+  if (reason.empty()) {
+    refused_patterns_.erase(path);
+  } else if (refused_patterns_.size() < kRefusedPatternsKept || refused_patterns_.count(path) != 0) {
+    refused_patterns_[path] = reason;
+  }
+}
+
+void ShareStatus::PatternFilesGone(const std::string& path) {
+  const base::MutexLock lock(mutex_);
+  std::erase_if(refused_patterns_, [&path](const auto& file) { return base::IsAtOrBelow(file.first, path); });
+}
+
 void ShareStatus::Committed() {
   const base::MutexLock lock(mutex_);
   last_commit_ = Clock::Get().Now();
@@ -118,6 +136,11 @@ Json::Value ShareStatus::ToJson() const {
   if (last_commit_ != 0) json["last_commit"] = Json::Int64(last_commit_);
   json["failed"] = Json::UInt64(failures_.Count());
   json["failures"] = failures_.ToJson();
+  for (const auto& [path, reason] : refused_patterns_) {
+    Json::Value& entry = json["refused_patterns"].append(Json::Value());
+    entry["path"] = path;
+    entry["reason"] = reason;
+  }
   return json;
 }
 

@@ -2,6 +2,7 @@
 
 #include <atomic>
 #include <cstdint>
+#include <map>
 #include <string>
 
 #include <json/value.h>
@@ -50,6 +51,10 @@ class ShareStatus {
   void LinksSkipped(uint64_t count);
   /// A file that could not be indexed as it should; the work goes on.
   void AddFailure(const std::string& reason, const std::string& path);
+  /// An ignore file was looked for; `reason` says why it is not followed, "" when it is, or is missing.
+  void PatternFileRead(const std::string& path, const std::string& reason);
+  /// What was at the path, or below it, is there no longer.
+  void PatternFilesGone(const std::string& path);
   void Committed();
 
   /// The members are described in docs/formats/daemon.md.
@@ -69,6 +74,7 @@ class ShareStatus {
   uint64_t links_skipped_ BASE_GUARDED_BY(mutex_) = 0;
   int64_t last_commit_ BASE_GUARDED_BY(mutex_) = 0;  ///< seconds since the epoch
   FileFailures failures_ BASE_GUARDED_BY(mutex_);
+  std::map<std::string, std::string> refused_patterns_ BASE_GUARDED_BY(mutex_);  ///< reasons by ignore file
 };
 
 }  // namespace ferrox::indexd

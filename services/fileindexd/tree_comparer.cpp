@@ -92,7 +92,10 @@ void TreeComparer::CompareEntry(const std::string& path, Place place, const stru
 
 void TreeComparer::CompareFolder(const std::string& folder) {
   WalkRules walk_rules;
-  walk_rules.place_of = [this](const std::string& path) { return context_.folders.PlaceOf(path); };
+  walk_rules.place_of = [this](const std::string& path) { return rules_.PlaceByPatterns(path, true); };
+  walk_rules.exclusions_in = [this](const std::string& path, bool may_have_file) {
+    return context_.exclusions.In(path, may_have_file);
+  };
   walk_rules.skip_name = &PathRules::SkipName;
   walk_rules.may_enter = [this](const std::string& path, const struct stat& status, dev_t device) {
     return rules_.MayEnter(path, status, device);
@@ -141,7 +144,7 @@ ComparisonActions TreeComparer::Actions(const std::string& folder) {
   actions.examine = [this, &status, folder, count, count_at] {
     context_.share.interruption.Check();
     if (*count == nullptr && std::chrono::steady_clock::now() >= count_at)
-      *count = std::make_unique<FileCount>(folder, context_.folders, status);
+      *count = std::make_unique<FileCount>(folder, context_.folders, context_.exclusions, status);
     commits_.CommitIfDue();
   };
   return actions;

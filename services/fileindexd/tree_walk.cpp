@@ -34,6 +34,7 @@ struct TreeWalk::Level {
   size_t next = 0;
   uint64_t links_examined = 0;
   std::set<std::string, std::less<>> not_entered;
+  std::set<std::string> on_the_way;  ///< paths that patterns leave out, of folders that hold an indexed one
 
   std::string Name(const Item& item) const {
     return names.substr(item.offset, item.length - static_cast<size_t>(item.below));
@@ -99,7 +100,8 @@ bool TreeWalk::Next(Entry& entry) {
 }
 
 TreeWalk::Place TreeWalk::PlaceIn(const Level& level, const std::string& path) const {
-  return level.indexed ? Place::kIndexed : rules_.place_of(path);
+  if (!level.indexed) return rules_.place_of(path);
+  return !level.on_the_way.empty() && level.on_the_way.count(path) != 0 ? Place::kOnTheWay : Place::kIndexed;
 }
 
 bool TreeWalk::Descend(int parent_fd, const std::string& name, const std::string& path, bool indexed, Entry& entry) {
@@ -130,6 +132,7 @@ void TreeWalk::ReadNames(Level& level) {
   const int copy = fcntl(level.folder.Get(), F_DUPFD_CLOEXEC, 0);
   const base::OpenFolderPtr dir(copy < 0 ? nullptr : fdopendir(copy));
   if (!dir) return;
+  bool has_ignore_file = false;
   while (true) {
     errno = 0;
     const dirent* entry = readdir(dir.get());
@@ -144,6 +147,7 @@ void TreeWalk::ReadNames(Level& level) {
       rules_.on_problem(level.prefix + name, ENAMETOOLONG);
       continue;
     }
+    has_ignore_file = has_ignore_file || name == services::kIgnoreFileName;
     const auto length = static_cast<uint16_t>(name.size());
     level.items.push_back({level.names.size(), length, false});
     if (IsFolder(level.folder.Get(), *entry)) {
@@ -152,12 +156,34 @@ void TreeWalk::ReadNames(Level& level) {
     level.names += name + "/";
   }
   const int error = errno;
+  if (level.indexed) DropExcluded(level, has_ignore_file);
   const std::string_view names = level.names;
   std::sort(level.items.begin(), level.items.end(), [names](const Item& left, const Item& right) {
     if (left.below != right.below) return right.below;
     return names.substr(left.offset, left.length) < names.substr(right.offset, right.length);
   });
   errno = error;
+}
+
+/// The item of what lies below a folder stands behind that of its name.
+void TreeWalk::DropExcluded(Level& level, bool has_ignore_file) const {
+  const auto exclusions = rules_.exclusions_in(level.prefix.substr(0, level.prefix.size() - 1), has_ignore_file);
+  if (exclusions == nullptr) return;
+  auto kept = level.items.begin();
+  for (auto item = level.items.begin(); item != level.items.end();) {
+    const bool is_folder = item + 1 != level.items.end() && (item + 1)->below;
+    const auto end = item + (is_folder ? 2 : 1);
+    const std::string_view name = std::string_view(level.names).substr(item->offset, item->length);
+    Place place = Place::kIndexed;
+    if (exclusions->Of(name, is_folder) == services::Exclusion::kLeftOut) {
+      const std::string path = level.prefix + std::string(name);
+      place = is_folder ? rules_.place_of(path) : Place::kOutside;
+      if (place == Place::kOnTheWay) level.on_the_way.insert(path);
+    }
+    kept = place == Place::kOutside ? kept : std::move(item, end, kept);
+    item = end;
+  }
+  level.items.erase(kept, level.items.end());
 }
 
 bool TreeWalk::MayEnter(Level& level, std::string_view name, const std::string& path, const struct stat& status) {

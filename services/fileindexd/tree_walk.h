@@ -10,18 +10,23 @@
 #include <vector>
 
 #include "services/fileindexd/share_folders.h"
+#include "services/support/exclusions.h"
 
 namespace ferrox::indexd {
 
 /// What a walk leaves out, and where it reports problems. The functions are called by the walking thread.
 struct WalkRules {
   /// What a path is for the walk: entries outside are left out, with what is below; a folder on the way is entered, but
-  /// not returned. Not asked below an indexed folder, where all is indexed.
+  /// not returned. Not asked below an indexed folder, where all is indexed that no pattern leaves out.
   std::function<ShareFolders::Place(const std::string& path)> place_of = [](const std::string&) {
     return ShareFolders::Place::kIndexed;
   };
   /// Whether a name is never indexed, nor anything below it.
   std::function<bool(const std::string& name)> skip_name = [](const std::string&) { return false; };
+  /// What patterns leave out in an indexed folder, which is not looked at; null: nothing. `may_have_file` is false
+  /// where the folder holds no ignore file. Folders that are left out are asked about by place_of once more.
+  std::function<services::Exclusions::FolderPtr(const std::string& folder, bool may_have_file)> exclusions_in =
+      [](const std::string&, bool) { return nullptr; };
   /// Whether a folder found below one on the device `parent_device` may be entered; asked at each look at the folder.
   std::function<bool(const std::string& path, const struct stat& status, dev_t parent_device)> may_enter =
       [](const std::string&, const struct stat&, dev_t) { return true; };
@@ -73,6 +78,7 @@ class TreeWalk {
   /// Opens and reads a folder, which is walked next. True when it could not be read and `entry` says so.
   bool Descend(int parent_fd, const std::string& name, const std::string& path, bool indexed, Entry& entry);
   void ReadNames(Level& level);
+  void DropExcluded(Level& level, bool has_ignore_file) const;
   /// True when `entry` is to be returned.
   bool Find(Level& level, const Item& item, Entry& entry);
   bool MayEnter(Level& level, std::string_view name, const std::string& path, const struct stat& status);

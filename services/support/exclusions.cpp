@@ -103,7 +103,7 @@ Exclusions::FolderPtr Exclusions::Make(const std::string& folder, bool may_have_
     made.admin_ = FolderExclusions::Entered(above->admin_, name);
     made.files_ = FolderExclusions::Entered(above->files_, name);
   }
-  if (may_have_file) AddFile(made, folder);
+  may_have_file ? AddFile(made, folder) : tell_(folder + "/" + kIgnoreFileName, "");
   return std::make_shared<const FolderExclusions>(std::move(made));
 }
 
@@ -117,6 +117,12 @@ Exclusion Exclusions::Of(const std::string& path, bool is_folder) {
   if (!base::IsBelow(path, root_) || IsConfigured(path)) return Exclusion::kNone;
   const std::string_view folder = base::ParentOf(path);
   return In(std::string(folder))->Of(std::string_view(path).substr(folder.size() + 1), is_folder);
+}
+
+void Exclusions::Forget() {
+  const base::MutexLock lock(mutex_);
+  by_folder_.clear();
+  last_ = nullptr;
 }
 
 /// Goes up to the indexed folder, and down again: the topmost that is chosen decides.

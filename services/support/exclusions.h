@@ -94,6 +94,8 @@ class Exclusions {
   bool LeavesOut(const std::string& path, bool is_folder) { return Of(path, is_folder) == Exclusion::kLeftOut; }
   /// Whether the path is left out whatever it is, a file or a folder.
   bool LeavesOutAll(const std::string& path) { return LeavesOut(path, false) && LeavesOut(path, true); }
+  /// Has ignore files read again where they are asked about next.
+  void Forget();
   /// Which pattern decided Of; for people.
   ExclusionReason Explain(const std::string& path, bool is_folder);
 

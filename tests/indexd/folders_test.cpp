@@ -147,7 +147,8 @@ TEST_F(FoldersTest, FoldersOfAShareThatIsNotToBeFoundAreNotLeftOut) {
   MakeTree();
   const ShareFolders folders = ShareFolders::Load(share, root);
   kova::host::RemoveShare(share);
-  PathRules rules(share, root, folders);
+  services::Exclusions exclusions(root, folders.Exclusions());
+  PathRules rules(share, root, folders, exclusions);
   for (const char* name : {"d", "d/f.txt", "gone/f.txt"}) EXPECT_THROW(rules.PlaceOf(At(name)), Error) << name;
   kova::host::AddShare({share, root});
 }
