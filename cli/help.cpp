@@ -114,8 +114,8 @@ void ThrowNoCommand(const std::vector<std::string>& words) {
   const std::string list = words[0] + " is followed by one of: " + Joined(known);
   if (words.size() < 2) throw UsageError("a word is missing: " + list + kTryHelp);
   const std::string name = words[0] + " " + words[1];
-  throw UsageError("there is no command \"" + EscapeForTerminal(name) + "\"" + DidYouMean(words[1], known) + "\n" +
-                   list + kTryHelp);
+  throw UsageError("there is no command \"" + EscapeForTerminal(name) + "\"" + DidYouMean(name, Names(second, false)) +
+                   "\n" + list + kTryHelp);
 }
 
 void ThrowNoGlobalOption(const std::string& option) {

@@ -1,5 +1,11 @@
-#include <algorithm>
+#include <unistd.h>
 
+#include <algorithm>
+#include <memory>
+#include <string>
+#include <vector>
+
+#include <kova/instance.h>
 #include <kova/user.h>
 
 #include "platform/host/accounts.h"
@@ -18,6 +24,14 @@ int Give(bool found, const Account& account, KOVAUser** user) {
   return 0;
 }
 
+/// A process of a user without an account, as containers have them, can become nobody else: its number is name enough
+/// for an instance of its own. For a process that can, the name must lead back to the user.
+bool IsOwnUserWithoutAccount(uid_t uid) {
+  uid_t real = 0, effective = 0, saved = 0;
+  if (uid == 0 || kova::InstanceRoot().empty() || getresuid(&real, &effective, &saved) != 0) return false;
+  return real == uid && effective == uid && saved == uid;
+}
+
 }  // namespace
 
 int KOVAUserGet(const char* name, KOVAUser** user) {
@@ -31,7 +45,12 @@ int KOVAUserGetByUID(uint32_t uid, KOVAUser** user) {
   if (user == nullptr) return KOVA_FAIL(KOVA_ERR_BAD_PARAMETER);
   *user = nullptr;
   Account account;
-  return Give(kova::host::FindAccount(static_cast<uid_t>(uid), account), account, user);
+  bool found = kova::host::FindAccount(static_cast<uid_t>(uid), account);
+  if (!found && IsOwnUserWithoutAccount(uid)) {
+    account = {std::to_string(uid), uid, getegid(), ""};
+    found = true;
+  }
+  return Give(found, account, user);
 }
 
 int KLIBGroupIsAdminGroupMem(const char* name, int only_local) {

@@ -82,11 +82,13 @@ class ToolCase(unittest.TestCase):
         self.env = dict(os.environ, FERROX_ROOT=self.root, LC_ALL="C.UTF-8")
         for folder in ("photo/trip", "photo/tree/deep", "photos/a b"):
             os.makedirs(f"{self.root}/vol/{folder}")
-        write_json(f"{self.root}/etc/kova/shares.json",
-                   [{"name": name, "path": f"{self.root}/vol/{name}"} for name in ("photo", "photos")])
+        self.write_shares("photo", "photos")
         kinds = {"document": True, "audio": False, "video": False, "photo": True}
         write_json(f"{self.root}/var/packages/Ferrox/etc/fileindex.folders",
                    [{"path": path, "name": "n", **kinds} for path in ("/photo/trip", "/photos/a b", "/gone/x")])
+
+    def write_shares(self, *names):
+        write_json(f"{self.root}/etc/kova/shares.json", [{"name": name, "path": f"{self.root}/vol/{name}"} for name in names])
 
     def run_tool(self, *words, cwd="/"):
         return subprocess.run([TOOL, *words], env=self.env, cwd=cwd, capture_output=True, timeout=60, check=False)
@@ -269,8 +271,7 @@ class ToolTest(ToolCase):
 
     def test_others_tell_what_they_left_out(self):
         os.mkdir(f"{self.root}/vol/gone")
-        write_json(f"{self.root}/etc/kova/shares.json",
-                   [{"name": name, "path": f"{self.root}/vol/{name}"} for name in ("gone", "photo", "photos")])
+        self.write_shares("gone", "photo", "photos")
         paused = {"success": False, "error": {"code": 1409, "msg": "paused"}}
         self.daemon("kovaelasticd", ping=success({}), index_stat=success({}), document_get_by_query=lambda data: paused
                     if data["id"] == "fileindex_photo" else success([{"KOVAMDPath": "/v/bad", "_KOVAExtractError": "torn"}]))

@@ -18,7 +18,8 @@ typedef struct KOVAUser {
 } KOVAUser;
 
 /// Look a user up. 0 and a record that the caller frees with KOVAUserFree, or below 0, with `*user` null:
-/// KOVA_ERR_NO_SUCH_USER, or KOVA_ERR_SYSTEM when the database cannot be asked.
+/// KOVA_ERR_NO_SUCH_USER, or KOVA_ERR_SYSTEM when the database cannot be asked. The process's own user needs no account
+/// where it runs an instance of its own and can become nobody else: its name is then its number.
 int KOVAUserGet(const char* name, KOVAUser** user);
 int KOVAUserGetByUID(uint32_t uid, KOVAUser** user);
 /// Frees a record and its texts; NULL is allowed.
