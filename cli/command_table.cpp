@@ -2,6 +2,7 @@
 
 #include "cli/folder_exclusions.h"
 #include "cli/share_commands.h"
+#include "cli/token_commands.h"
 #include "cli/user_commands.h"
 
 /// The commands as data. A row that is added here has help, usage line, checks of its options and completion at once;
@@ -189,6 +190,7 @@ const std::vector<CommandGroup>& CommandTable() {
                                                   {"What is indexed", Joined(FolderCommands(), IndexCommands())},
                                                   {"Shares", ShareCommands()},
                                                   {"Volumes, homes, users", HostEventCommands()},
+                                                  TokenCommands(),
                                                   Inspection()};
   return table;
 }

@@ -16,6 +16,7 @@
 #include "services/kovawebd/listener.h"
 #include "services/kovawebd/service.h"
 #include "services/kovawebd/settings.h"
+#include "services/kovawebd/tokens.h"
 #include "services/support/daemon.h"
 
 namespace {
@@ -42,7 +43,8 @@ void Serve() {
   for (const web::Listener& listener : listeners) {
     if (!listener.is_local) options.addresses.push_back(listener.address);
   }
-  web::Service service(std::move(options));
+  web::Tokens tokens(web::TokensPath());
+  web::Service service(std::move(options), tokens);
   const web::HttpServer server(std::move(listeners),
                                [&service](const web::Request& request) { return service.Handle(request); });
   daemon.NotifyReady();

@@ -11,6 +11,7 @@
 #include "services/kovawebd/openapi.h"
 #include "services/kovawebd/query_string.h"
 #include "services/kovawebd/routes.h"
+#include "services/kovawebd/token_routes.h"
 
 namespace ferrox::web {
 
@@ -30,10 +31,12 @@ std::string AsUtf8(std::string_view text) {
 
 }  // namespace
 
-Service::Service(Options options) : options_(std::move(options)), routes_(MakeRoutes()) {}
+Service::Service(Options options, Tokens& tokens)
+    : options_(std::move(options)), tokens_(tokens), routes_(MakeRoutes()) {}
 
 std::vector<Route> Service::MakeRoutes() const {
   std::vector<Route> routes = SearchRoutes();
+  for (Route& route : TokenRoutes(tokens_)) routes.push_back(std::move(route));
   routes.push_back({"GET",
                     "/api/v1/status",
                     "status",
@@ -53,10 +56,14 @@ std::vector<Route> Service::MakeRoutes() const {
 Who Service::Identify(const Request& request, const Route& route) const {
   if (route.whom == Route::For::kAnyone) return {};
   if (request.local_user.has_value()) return {*request.local_user, false};
-  throw Problem{401, "a token is needed"};
+  const Who who = WhoBringsToken(request, tokens_);
+  if (route.whom == Route::For::kLocal) throw Problem{403, "tokens are made, listed and revoked on the Unix socket"};
+  return who;
 }
 
-Json::Value Service::Status(const Call&) const {
+/// A token is good as long as its user is answered: the engine is asked here, too.
+Json::Value Service::Status(const Call& call) const {
+  if (call.who.by_token) (void)AskEngineFor(call.who, "shares", Json::Value(Json::objectValue));
   Json::Value status;
   status["pid"] = getpid();
   status["version"] = FERROX_VERSION;

@@ -5,6 +5,7 @@
 
 #include "services/kovawebd/message.h"
 #include "services/kovawebd/route.h"
+#include "services/kovawebd/tokens.h"
 #include "wire/cancellation.h"
 
 namespace ferrox::web {
@@ -16,7 +17,8 @@ class Service {
     std::vector<std::string> hosts = {};      ///< names by which the daemon may be asked, beside its addresses
     std::vector<std::string> addresses = {};  ///< where it listens by TCP
   };
-  explicit Service(Options options);
+  /// @param tokens must outlive the service
+  Service(Options options, Tokens& tokens);
   Service(const Service&) = delete;
   Service& operator=(const Service&) = delete;
 
@@ -33,6 +35,7 @@ class Service {
   Json::Value Status(const Call& call) const;
 
   const Options options_;
+  Tokens& tokens_;
   const std::vector<Route> routes_;
   wire::Cancellation cancellation_;
 };

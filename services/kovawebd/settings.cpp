@@ -23,9 +23,11 @@ namespace {
 
 using services::EngineIds;
 
+constexpr char kTokensFile[] = "/tokens.json";
+
 /// Of a daemon that was root's until now: its only file.
 bool GiveTokens(const EngineIds& to) {
-  const std::string path = InstancePath(services::kWebFolder) + "/tokens.json";
+  const std::string path = InstancePath(services::kWebFolder) + kTokensFile;
   const base::UniqueFd file(open(path.c_str(), O_PATH | O_NOFOLLOW | O_CLOEXEC));
   struct stat status = {};
   const bool is_roots = file.Valid() && fstat(file.Get(), &status) == 0 && S_ISREG(status.st_mode) &&
@@ -66,6 +68,12 @@ Settings SettingsAsTold() {
 }
 
 }  // namespace
+
+std::string TokensPath() {
+  const std::string folder = InstancePath(services::kWebFolder);
+  FERROX_FAIL_IF(!base::MakeFolders(folder, 0700), Error::kInternal, "cannot make " + folder + ": " + ErrnoText());
+  return folder + kTokensFile;
+}
 
 void PrepareForUser(const std::string& user, const Settings& settings) {
   Prepare(services::IdsOfAccount(user, "the web daemon"), settings);

@@ -11,6 +11,9 @@ struct Settings {
   std::vector<std::string> addresses;  ///< where it listens, "127.0.0.1:9280", "[::1]:0"; port 0: any that is free
   std::vector<std::string> hosts;      ///< by which names it may be asked, without a port
 };
+/// Where the tokens are; the folder is made where it is missing.
+std::string TokensPath();
+
 using ReadSettings = std::function<Settings()>;
 
 /// As root, in an instance of root's: makes what the daemon needs of others' folders (its pid file, the folders of its
