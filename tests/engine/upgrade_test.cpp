@@ -225,7 +225,7 @@ TEST_F(UpgradeTest, AFullVolumeIsToldWithWhatIsNeededAndAnEndLeavesNothingBehind
 
   options = {};
   options.turn_bytes = 1;
-  options.on_turn = [](int64_t, int64_t) { std::this_thread::sleep_for(milliseconds(5)); };
+  options.on_turn = [](int64_t, int64_t) { std::this_thread::sleep_for(milliseconds(200)); };
   index = Open(options);
   while (index->Upgrading()->of == 0) std::this_thread::yield();
   index.reset();

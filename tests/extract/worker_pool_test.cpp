@@ -152,7 +152,7 @@ TEST_F(WorkerPoolTest, WorkersAreReplacedInTime) {
   options.idle_time = 20ms;
   WorkerPool pool(options);
   EXPECT_EQ("1", Read(pool, "count").text);
-  for (int i = 0; i < 500 && pool.Status()["workers"].asUInt() != 0; ++i) std::this_thread::sleep_for(10ms);
+  for (int i = 0; i < 6000 && pool.Status()["workers"].asUInt() != 0; ++i) std::this_thread::sleep_for(10ms);
   EXPECT_EQ(0U, pool.Status()["workers"].asUInt()) << "an idle pool is empty";
   EXPECT_THROW(pool.Probe(Program::kPhoto), Error) << "a program that cannot be run";
   EXPECT_EQ("1", Read(pool, "count").text);

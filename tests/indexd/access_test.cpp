@@ -101,7 +101,7 @@ TEST_F(AccessTest, RightsOvertakeContentUnderEachNameOfAFile) {
     ASSERT_EQ(0, lstat(At("d/a").c_str(), &status));
     Queue(R"({"event":0,"is_dir":true,"path":")" + root + R"(","path_old":"","data":{"files":[)" +
           std::to_string(status.st_ino) + "]}}\n");
-    for (int i = 0; names < 2 && i < 1000; ++i) usleep(10000);
+    for (int i = 0; names < 2 && i < 6000; ++i) usleep(10000);
   };
   for (int i = 0; i < 300; ++i) test::WriteFile(At("f" + std::to_string(i)), "changed");
   fs::remove(queue_path);

@@ -13,12 +13,12 @@ namespace {
 
 using ShareWorkerTest = WorkerTest;
 
-/// From Begin on, all files but the awaited ones take to read until those are written; 10 s if they never are.
+/// From Begin on, all files but the awaited ones take to read until those are written; 60 s if they never are.
 class SlowFiles {
  public:
   SlowFiles(FakeIndex& index, const std::set<std::string>& awaited) : awaited_(awaited), left_(awaited) {
     index.before_read = [this](const std::string& path) {
-      for (int i = 0; slow_ && awaited_.count(path) == 0 && i < 1000; ++i) usleep(10000);
+      for (int i = 0; slow_ && awaited_.count(path) == 0 && i < 6000; ++i) usleep(10000);
       if (awaited_.count(path) == 0) slow_ = false;
     };
   }

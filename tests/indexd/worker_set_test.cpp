@@ -132,7 +132,7 @@ TEST_F(WorkerSetTest, HungEngineMakesNobodyMute) {
   Configure("b", {{"", "davp"}});
   Do("folders");
   Do("look");
-  for (int i = 0; asked < 2 && i < 1000; ++i) usleep(10000);
+  for (int i = 0; asked < 2 && i < 6000; ++i) usleep(10000);
   std::thread ending([this] { Do("delete"); });
   EXPECT_NE(std::string::npos, Running().find('b'));
   ending.join();

@@ -75,6 +75,7 @@ class Watch:
     def __init__(self, pid):
         self.pid = pid
         self.peak_kib, self.descriptors, self.threads, self.most = 0, 0, 0, 0
+        self.starved = 0  # seconds in which there was no processor for a worker
         self.stopped = threading.Event()
         self.thread = threading.Thread(target=self.run)
         self.thread.start()
@@ -93,6 +94,8 @@ class Watch:
                     self.peak_kib = max(self.peak_kib, int(facts["VmPeak"].split()[0]))
                     self.threads = max(self.threads, int(facts["Threads"]))
                     self.descriptors = max(self.descriptors, len(os.listdir(f"/proc/{worker}/fd")))
+                    with open(f"/proc/{worker}/schedstat", encoding="ascii") as file:
+                        self.starved = max(self.starved, int(file.read().split()[1]) / 1e9)
                 except (OSError, KeyError):
                     continue  # it has ended
 
@@ -282,6 +285,7 @@ class HostileTest(InstanceTestCase):
         finally:
             watch.stop()
         self.threads.shutdown()
+        self.starved = watch.starved
         descriptors_after, memory_after = self.at_rest()
         status = self.status()
         grown = memory_after - memory
@@ -314,7 +318,7 @@ class HostileTest(InstanceTestCase):
         endless = [path for seconds, error, path in self.slow if error == "took too long"]
         names = {os.path.basename(path) for path in endless}
         self.assertIn(b"endless.mp4", names)
-        if not SANITIZED:
+        if not SANITIZED and self.starved < 15:  # else readers that end in time may not
             self.assertEqual(1, len(names), names)
 
     def test_damaged_files(self):

@@ -197,7 +197,7 @@ class LiveTest(unittest.TestCase):
             os.chmod(folder, 0o755)
             programs = os.environ["FERROX_BIN"]
             for program in ("fileindexctl", "kovaelasticd", "kovanotifyd", "fileindexd", "kovacontentextractd",
-                            "kovacontentworker"):
+                            "kovacontentworker", "kovawebd"):
                 shutil.copy(f"{programs}/{program}", folder)
             shutil.copytree(f"{programs}/../lib", f"{folder}/lib", ignore=shutil.ignore_patterns("*.a"))
             for script in ("instance.py", "live.py", "live_test.py"):

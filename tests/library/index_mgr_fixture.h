@@ -33,6 +33,7 @@ class IndexMgrTest : public test::LibraryTest {
   }
   void AddShare(const std::string& name, const std::string& volume) {
     platform_.shares[name] = {test::TestRoot() + volume + name};
+    (void)fs::remove_all(platform_.shares[name].path);
     fs::create_directories(platform_.shares[name].path + "/a/b");
     queues_[name] = sdk::SDKShare(name).GetQueuePath();
     (void)fs::remove(queues_[name]);

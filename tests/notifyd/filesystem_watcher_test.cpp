@@ -41,6 +41,30 @@ using testing::ElementsAreArray;
 using testing::IsEmpty;
 namespace fs = std::filesystem;
 
+/// Mounts an empty file system that nobody else sees. @return whether that is permitted, with errno.
+bool MountPrivately(const std::string& folder) {
+  return unshare(CLONE_NEWNS) == 0 && mount(nullptr, "/", nullptr, MS_REC | MS_PRIVATE, nullptr) == 0 &&
+         mount("none", folder.c_str(), "tmpfs", 0, nullptr) == 0;
+}
+
+/// A file system that is fast enough to overflow the kernel's queue, and in which nobody else does: a mark is told of
+/// the changes of all. Where it may not be mounted, one that is shared.
+class QuietFileSystem {
+ public:
+  QuietFileSystem() : is_own_(MountPrivately(point_.Path())) {}
+  ~QuietFileSystem() {
+    if (is_own_) (void)umount2(point_.Path().c_str(), MNT_DETACH);
+  }
+  std::string Path() const {
+    if (is_own_) return point_.Path();
+    return access("/dev/shm", W_OK) == 0 ? "/dev/shm" : fs::temp_directory_path().string();
+  }
+
+ private:
+  const TempDir point_;
+  const bool is_own_;
+};
+
 class FilesystemWatcherTest : public testing::Test {
  protected:
   void SetUp() override {
@@ -75,8 +99,7 @@ class FilesystemWatcherTest : public testing::Test {
   std::string MountOwnFileSystem(const std::string& name) {
     const std::string folder = dir_ / name;
     fs::create_directories(folder);
-    const bool done = unshare(CLONE_NEWNS) == 0 && mount(nullptr, "/", nullptr, MS_REC | MS_PRIVATE, nullptr) == 0 &&
-                      mount("none", folder.c_str(), "tmpfs", 0, nullptr) == 0;
+    const bool done = MountPrivately(folder);
     const int error = errno;
     [&] {
       if (!done) GTEST_SKIP() << "no mounts of one's own: " << strerror(error);
@@ -86,8 +109,8 @@ class FilesystemWatcherTest : public testing::Test {
 
   void MakeChanges(unsigned seed, bool fresh_names);
 
-  /// Quiet, and fast enough to overflow the kernel's queue, where there is one.
-  TempDir dir_{access("/dev/shm", W_OK) == 0 ? "/dev/shm" : fs::temp_directory_path().string()};
+  const QuietFileSystem file_system_;
+  TempDir dir_{file_system_.Path()};
   test::WatcherRecorder notes_{dir_.Path()};
   std::unique_ptr<FilesystemWatcher> watcher_;
 };

@@ -193,6 +193,7 @@ TEST_F(FrameServerTest, ABoundUserHasFewRequestsAndConnections) {
   ASSERT_NE(ended, refused.end()) << "the newcomer takes the place of an idle one";
   EXPECT_EQ(ended->ReceiveFrame(), std::nullopt);
   refused.erase(ended);
+  while (at_work < 2) std::this_thread::yield();
   EXPECT_EQ(at_work, 2);
   EXPECT_GE(niceness, 10) << "others go first";
   go_on.set_value();
