@@ -20,7 +20,7 @@
 #include <json/value.h>
 
 #include "services/kovaelasticd/query/query.h"
-#include "services/kovaelasticd/store/name_rules.h"
+#include "base/name_rules.h"
 #include "services/kovaelasticd/store/sqlite_store.h"
 
 namespace {
@@ -147,7 +147,7 @@ class Bench {
   }
 
   void MeasureNames() {
-    rules_ = ferrox::engine::NameRules::TextOf({"*3.txt", "f3", "~*", ".DS_Store", "*.part"}, false);
+    rules_ = base::NameRules::TextOf({"*3.txt", "f3", "~*", ".DS_Store", "*.part"}, false);
     const double began = ThreadMs();
     while (!store_->Obeys(rules_)) store_->ObeySome(rules_);
     printf("all names compared in      %6.0f ms\n", ThreadMs() - began);

@@ -17,6 +17,7 @@
 #include "cli/ask.h"
 #include "cli/escape.h"
 #include "cli/format.h"
+#include "cli/hidden_name.h"
 #include "cli/output.h"
 #include "cli/why_not_indexed.h"
 #include "fileindex/elastic/elastic_control.h"
@@ -190,6 +191,7 @@ void PrintWhyNotShown(const std::string& path, const std::string& share, const A
   const std::string root = sdk::SDKShare(share).GetPath();
   const AccessWay way = FollowAccess(path, root, user);
   const std::string reason = WhyNotShown(way, root, share, user);
+  const std::string hiding = RuleThatHidesName(path);
   // Rights are one part of what a system decides by; what this page says of them is held against the whole.
   const bool disagrees = way.kernel_opens.has_value() && *way.kernel_opens != way.Granted();
   if (json) {
@@ -199,6 +201,7 @@ void PrintWhyNotShown(const std::string& path, const std::string& share, const A
     told["reason"] = reason;
     told["way"] = WayAsJson(way);
     if (way.kernel_opens.has_value()) told["opens"] = *way.kernel_opens;
+    if (!hiding.empty()) told["hidden_by"] = hiding;
     PrintJson(told);
     return;
   }
@@ -208,6 +211,7 @@ void PrintWhyNotShown(const std::string& path, const std::string& share, const A
   if (disagrees) {
     (void)printf("    a process of this user %s it all the same\n", *way.kernel_opens ? "can open" : "cannot open");
   }
+  PrintHiding(hiding);
 }
 
 }  // namespace ferrox::cli

@@ -1,5 +1,7 @@
 #include <cstdio>
 #include <optional>
+#include <string>
+#include <utility>
 
 #include "cli/as_user.h"
 #include "cli/ask.h"
@@ -8,6 +10,7 @@
 #include "cli/explain_access.h"
 #include "cli/folder_path.h"
 #include "cli/format.h"
+#include "cli/hidden_name.h"
 #include "cli/output.h"
 #include "cli/user_commands.h"
 #include "common/error.h"
@@ -29,15 +32,18 @@ Json::Value AskForDocument(const std::string& path, const std::optional<AskedUse
   return AskEngine(wire::EngineRequest("show", data))["document"];
 }
 
-void PrintForUser(Json::Value document, const Arguments& arguments) {
+/// `hiding`: the rule by which the user of "--as" is not shown it everywhere, or "".
+void PrintForUser(Json::Value document, const std::string& hiding, const Arguments& arguments) {
   const std::string text = TextOf(document, fileindex::elastic::kKOVAMDTextContent);
   if (arguments.Has("--text")) {
     PrintWholeText(text);
   } else if (arguments.Has("--json")) {
+    if (!hiding.empty()) document["hidden_by"] = hiding;
     PrintJson(document);
   } else {
     document.removeMember(fileindex::elastic::kKOVAMDTextContent);
     PrintDocument(document, text, Fields::kPublic);
+    PrintHiding(hiding);
   }
 }
 
@@ -53,7 +59,8 @@ void TellNotShown(const std::string& path, const std::string& sentence, const st
 
 /// @return whether the user is shown the file.
 bool ShowForUser(const std::string& path, const Arguments& arguments, const std::optional<AskedUser>& user) try {
-  PrintForUser(AskForDocument(path, user), arguments);
+  Json::Value document = AskForDocument(path, user);
+  PrintForUser(std::move(document), user.has_value() ? RuleThatHidesName(path) : "", arguments);
   return true;
 } catch (const Refusal& refusal) {
   if (refusal.Code() == Error::kEngineBadRequest) throw UsageError(EscapeForTerminal(refusal.Reason()));

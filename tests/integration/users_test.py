@@ -212,6 +212,15 @@ esac
                 self.assertNotIn(b"all the same", done.stdout)
         self.assertIn(b"lantern in ann/a.txt", self.for_user(ANN, "show", f"{plans}/ann/a.txt").stdout)
         self.assertEqual(b"lantern in ann/a.txt", self.for_user(ANN, "show", "--text", "/plans/ann/a.txt").stdout)
+        table = f"{self.instance.root}/etc/kova/shares.json"
+        with open(table, encoding="utf-8") as file:
+            shares = json.load(file)
+        for share in shares:
+            share.update({"veto_files": "/zzz/ANN/", "hide_files": "/b.t?t/"} if share["name"] == "plans" else {})
+        write(table, json.dumps(shares))
+        for path, rule in ((f"{plans}/ann/a.txt", b"veto files = ANN"), (f"{plans}/bob/b.txt", b"hide files = b.t?t")):
+            self.assertIn(b"hidden by %s of share plans\n" % rule, self.by_root(ANN, "show", path).stdout)
+        self.assertNotIn(b"hidden by", self.by_root(ANN, "show", f"{plans}/some.txt").stdout)
 
     def test_the_engine_is_a_user_of_its_own_and_is_given_what_root_made_alone(self):
         """The indices of an engine of root's, of which one is elsewhere, and what others could have put in their place."""

@@ -4,13 +4,13 @@
 #include <utility>
 #include <vector>
 
+#include "base/name_rules.h"
 #include "base/path.h"
 #include "services/kovaelasticd/commands/commands.h"
 #include "services/kovaelasticd/commands/entered_shares.h"
 #include "services/kovaelasticd/commands/members.h"
 #include "services/kovaelasticd/commands/user_error.h"
 #include "services/kovaelasticd/commands/user_search.h"
-#include "services/kovaelasticd/store/name_rules.h"
 #include "wire/fields.h"
 
 namespace ferrox::engine {
@@ -60,7 +60,7 @@ Json::Value LoadDocument(Index& index, const std::string& path, bool with_text) 
 /// By the share's rules, for users by name; `path` lies in the share. A name that is only hidden is shown to who knows
 /// it.
 bool IsVetoed(const ShareNote& note, const std::string& path) {
-  return !note.names.has_value() || NameRules(note.names->vetoed).MatchAnyIn(path.substr(note.root.size()));
+  return !note.names.has_value() || base::NameRules(note.names->vetoed).MatchAnyIn(path.substr(note.root.size()));
 }
 
 /// The document, where the asker may see it: it has an access record, the share can be entered and searched, and the

@@ -3,8 +3,8 @@
 #include <utility>
 #include <vector>
 
+#include "base/name_rules.h"
 #include "common/json_util.h"
-#include "services/kovaelasticd/store/name_rules.h"
 
 namespace ferrox::engine {
 
@@ -40,9 +40,9 @@ void ShareNote::ReadNames() {
   if (!(case_counts.isNull() || case_counts.isBool()) || !TakePatterns(told["veto_files"], patterns)) return;
   const bool counts = case_counts.isBool() && case_counts.asBool();
   SharedNames read;
-  read.vetoed = NameRules::TextOf(patterns, counts);
+  read.vetoed = base::NameRules::TextOf(patterns, counts);
   if (!TakePatterns(told["hide_files"], patterns)) return;
-  read.unseen = NameRules::TextOf(patterns, counts);
+  read.unseen = base::NameRules::TextOf(patterns, counts);
   names = std::move(read);
 }
 

@@ -17,7 +17,7 @@ void NameMarks::Load() {
   const bool there = row.Step();
   rules_ = there ? row.Text(0) : std::string_view();
   next_ = there && row.Int(1) == 0 ? 0 : kNone;
-  places_.SetNameRules(NameRules(rules_));
+  places_.SetNameRules(base::NameRules(rules_));
 }
 
 void NameMarks::Save() {
@@ -32,7 +32,7 @@ void NameMarks::Turn(const std::string& rules, int64_t version) {
   if (rules_ != rules) {
     rules_ = rules;
     next_ = 0;
-    places_.SetNameRules(NameRules(rules_));
+    places_.SetNameRules(base::NameRules(rules_));
     Save();
   }
   if (next_ == kNone) return;

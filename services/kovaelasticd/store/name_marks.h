@@ -4,7 +4,7 @@
 #include <memory>
 #include <string>
 
-#include "services/kovaelasticd/store/name_rules.h"
+#include "base/name_rules.h"
 #include "services/kovaelasticd/store/place_writer.h"
 #include "services/kovaelasticd/store/sqlite_db.h"
 

@@ -5,7 +5,7 @@
 #include <utility>
 #include <vector>
 
-#include "services/kovaelasticd/store/name_rules.h"
+#include "base/name_rules.h"
 #include "services/kovaelasticd/store/places.h"
 #include "services/kovaelasticd/store/row_watch.h"
 #include "services/kovaelasticd/store/sqlite_db.h"
@@ -30,7 +30,7 @@ class PlaceWriter {
   /// Brings the table up to date; `version` is that of the next commit.
   void Flush(int64_t version);
   /// Which names are marked from now on (Place::unseen).
-  void SetNameRules(NameRules rules) { name_rules_ = std::make_unique<const NameRules>(std::move(rules)); }
+  void SetNameRules(base::NameRules rules) { name_rules_ = std::make_unique<const base::NameRules>(std::move(rules)); }
   /// Writes the first part anew whose key is `key` or more. @return where to go on; -1: there is none behind it.
   int64_t MarkPart(int64_t key, int64_t version);
   /// Drops the changes, which were rolled back.
@@ -53,7 +53,7 @@ class PlaceWriter {
   Database& database_;
   std::vector<int64_t> documents_;  ///< that have changed
   std::vector<int64_t> folders_;
-  std::unique_ptr<const NameRules> name_rules_ = std::make_unique<const NameRules>("");
+  std::unique_ptr<const base::NameRules> name_rules_ = std::make_unique<const base::NameRules>("");
 };
 
 }  // namespace ferrox::engine

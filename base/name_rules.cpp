@@ -1,4 +1,4 @@
-#include "services/kovaelasticd/store/name_rules.h"
+#include "base/name_rules.h"
 
 #include <locale.h>  // NOLINT(modernize-deprecated-headers): newlocale
 #include <wctype.h>  // NOLINT(modernize-deprecated-headers): towlower_l
@@ -7,7 +7,7 @@
 
 #include "base/text.h"
 
-namespace ferrox::engine {
+namespace base {
 
 namespace {
 
@@ -15,7 +15,7 @@ constexpr char kCaseCounts = '=';
 
 /// The character that `text` begins with, or a byte that is none.
 std::string_view FirstCharacter(std::string_view text) {
-  return text.substr(0, std::max<size_t>(1, base::CharacterBytes(text)));
+  return text.substr(0, std::max<size_t>(1, CharacterBytes(text)));
 }
 
 uint32_t CodePointOf(std::string_view character) {
@@ -37,10 +37,10 @@ std::string WithoutCase(std::string_view name) {
   folded.reserve(name.size());
   while (!name.empty()) {
     const std::string_view character = FirstCharacter(name);
-    if (base::CharacterBytes(character) <= 1) {
-      folded += base::LowerAscii(character[0]);
+    if (CharacterBytes(character) <= 1) {
+      folded += LowerAscii(character[0]);
     } else {
-      base::AppendUtf8(folded, WithoutCase(CodePointOf(character)));
+      AppendUtf8(folded, WithoutCase(CodePointOf(character)));
     }
     name.remove_prefix(character.size());
   }
@@ -115,4 +115,4 @@ bool NameRules::MatchAnyIn(std::string_view path) const {
   return false;
 }
 
-}  // namespace ferrox::engine
+}  // namespace base

@@ -5,7 +5,7 @@
 #include <string_view>
 #include <vector>
 
-namespace ferrox::engine {
+namespace base {
 
 /// Patterns of names of files and folders, as shares have them: "*" stands for any characters, "?" for one; a whole
 /// name has to match. A byte that is no UTF-8 is a character of its own. Never changes, so any thread may use it.
@@ -29,4 +29,4 @@ class NameRules {
   std::vector<std::string> wild_;
 };
 
-}  // namespace ferrox::engine
+}  // namespace base
