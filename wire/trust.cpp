@@ -29,6 +29,7 @@ std::optional<Trust> AskTrust(std::chrono::milliseconds longest) {
                     ReadUids(reply.data["ended"], trust.ended);
   if (!read) return std::nullopt;
   trust.least_user = reply.data["least_user"].asUInt();
+  if (reply.data["memory"].isUInt()) trust.memory_mib = reply.data["memory"].asUInt();
   return trust;
 }
 

@@ -42,6 +42,12 @@ bool ReadExclusions(const Json::Value& object, Configuration::Exclusions& exclus
          ReadMember(object, "exclude_content", exclusions.lists.exclude_content);
 }
 
+bool ReadEngine(const Json::Value& object, Configuration::Engine& engine) {
+  constexpr uint32_t kMemoryMinMib = 32;
+  return object.isObject() && ReadMember(object, "memory", engine.memory_mib) &&
+         (!object.isMember("memory") || engine.memory_mib >= kMemoryMinMib);
+}
+
 Configuration Load(const std::string& path) {
   Configuration configuration;
   configuration.samba.config = InstanceRoot() + "/etc/samba/smb.conf";
@@ -56,6 +62,7 @@ Configuration Load(const std::string& path) {
                     (!value.isMember("exclusions") || ReadExclusions(value["exclusions"], configuration.exclusions)) &&
                     (!value.isMember("samba") || ReadSamba(value["samba"], configuration.samba)) &&
                     (!value.isMember("notifyd") || ReadNotifyd(value["notifyd"], configuration.notifyd)) &&
+                    (!value.isMember("engine") || ReadEngine(value["engine"], configuration.engine)) &&
                     (!value.isMember("web") || ReadWeb(value["web"], configuration.web));
   if (!read) configuration.problem = "is not an object of settings, or one has the wrong type";
   return configuration;

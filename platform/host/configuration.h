@@ -30,6 +30,9 @@ struct Configuration {
     std::vector<std::string> addresses;
     std::vector<std::string> hosts = {"localhost"};  ///< names, beside its addresses, by which it may be asked
   } web = {};
+  struct Engine {
+    uint32_t memory_mib = 0;  ///< what searches may hold in long lists; 0: by the host's memory
+  } engine = {};
   /// Users whose programs may search for others, and the least uid that they may search for.
   std::vector<std::string> trusted_clients = {};
   uint32_t least_user = 1000;

@@ -67,6 +67,7 @@ TrustedClients GetTrustedClients(std::optional<uid_t> own_client) {
   TrustedClients clients = none ? TrustedClients() : FindAccounts(settings->trusted_clients);
   if (!none && own_client.has_value()) clients.uids.push_back(*own_client);
   clients.least_user = settings->least_user;
+  if (settings->problem.empty()) clients.memory_mib = settings->engine.memory_mib;
   return clients;
 }
 

@@ -15,6 +15,7 @@ struct TrustedClients {
   /// Nor for these: accounts of /etc/passwd that have expired, by /etc/shadow as far as this process may read it. None
   /// where nobody is trusted.
   std::vector<uid_t> ended = {};
+  uint32_t memory_mib = 0;  ///< what searches may hold in long lists ("engine"); 0: the settings do not say
 };
 
 /// Those of now, and `own_client`, a daemon of the product's own, where there is one: reads those files where there are

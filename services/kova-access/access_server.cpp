@@ -24,6 +24,7 @@ Json::Value JsonOf(const wire::LiveFile& file) {
 Json::Value JsonOf(const wire::Trust& trust) {
   Json::Value json;
   json["least_user"] = trust.least_user;
+  if (trust.memory_mib != 0) json["memory"] = trust.memory_mib;
   for (const auto& [name, uids] : {std::pair("clients", &trust.clients), std::pair("ended", &trust.ended)}) {
     Json::Value& list = json[name] = Json::Value(Json::arrayValue);
     for (const uint32_t uid : *uids) list.append(uid);

@@ -38,7 +38,7 @@ wire::Trust ReadTrust() {
   const std::optional<services::EngineIds> web = services::WebUser();
   kova::host::TrustedClients clients =
       kova::host::GetTrustedClients(web.has_value() ? std::optional(web->uid) : std::nullopt);
-  return {std::move(clients.uids), clients.least_user, std::move(clients.ended)};
+  return {std::move(clients.uids), clients.least_user, std::move(clients.ended), clients.memory_mib};
 }
 
 void Serve() {

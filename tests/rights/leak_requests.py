@@ -29,7 +29,7 @@ def requests(share, own, theirs):
     def search(query, **data):
         a, b, c = rng.sample(own, 3)
         t = rng.choice(theirs)
-        text = query.format(a=a, b=b, c=c, t=t, p=a[:2], tp=t[:3], m=a[:-1] + "x", share=share)
+        text = query.format(a=a, b=b, c=c, t=t, p=a[:2], tp=t[:3], m=a[:-1] + "x", tm=t[:-1] + "x", share=share)
         found.append(("search", {"query": text, **data}))
 
     for _ in range(5):
@@ -51,6 +51,9 @@ def requests(share, own, theirs):
     search("{a}", ids=["fileindex_docs", "fileindex_hidden"])
     search("{a}", limit=100000)
     search("{a}", snippet=False)
+    for query in ("{a} {b} {c}", "{m} {a}", "{tm}", "{tm} {a}", "{a} {t}", "secret0 {a}", "dark", "{a} | {b}", "{a} +{t}"):
+        search(query, explain=True)
+        search(query, all_words=True, limit=100)
     search("{a}", mark_start="<", mark_end=">")
     for path in PATHS:
         for more in ({}, {"text": True}):

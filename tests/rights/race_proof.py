@@ -22,7 +22,7 @@ from race_rounds import ROUNDS, Ground
 
 ASKER = User(50001, [60001])
 TOKEN = re.compile(rb"zk\d{7}q")
-EXPECTED_ERRORS = {1404, 1405}
+EXPECTED_ERRORS = {1404, 1405, 1414}  # the last: too slow, on a machine that is busy
 
 
 class Asker:

@@ -2,6 +2,8 @@
 
 #include <algorithm>
 
+#include "services/kovaelasticd/store/work_limit.h"
+
 namespace ferrox::engine {
 
 namespace {
@@ -22,6 +24,7 @@ wire::Trust TrustOfSettings::Get() {
   const TrustClock::time_point began = TrustClock::now();
   if (began < until_) return last_;
   last_ = ask_().value_or(wire::Trust());
+  WorkLimit::SetBudget(last_.memory_mib);
   const TrustClock::time_point now = TrustClock::now();
   until_ = std::max(began + kTrustKept, now + kPausePerWait * (now - began));
   return last_;

@@ -14,7 +14,8 @@ namespace ferrox::engine {
 std::optional<wire::Trust> AskForTrust();
 
 /// Who may ask for users by name, as the settings say now, or said up to a second ago. While that cannot be told,
-/// nobody may. Any thread may call; one that calls while another asks waits for that answer.
+/// nobody may. They say, too, how much memory searches may have (WorkLimit::SetBudget); that is asked for with every
+/// ordinary user's connection. Any thread may call; one that calls while another asks waits for that answer.
 class TrustOfSettings {
  public:
   using Ask = std::function<std::optional<wire::Trust>()>;

@@ -17,7 +17,8 @@ using WorkClock = std::chrono::steady_clock;
 
 /// Steps of SQLite's machine between two looks at the clock: well below a millisecond.
 constexpr int kStepsBetweenLooks = 10000;
-constexpr uint64_t kMemoryMost = uint64_t{256} << 20;
+constexpr uint64_t kUsualMostMib = 512;
+constexpr uint64_t kBudgetMostMib = sizeof(size_t) > 4 ? uint64_t{UINT32_MAX} : 1024;
 
 /// Of the calling thread's request.
 struct Work {
@@ -28,7 +29,18 @@ struct Work {
 };
 thread_local Work t_work;
 
-std::atomic<size_t> g_held{0};  ///< by all
+std::atomic<size_t> g_held{0};          ///< by all
+std::atomic<uint32_t> g_budget_mib{0};  ///< 0: the usual one
+
+uint64_t UsualBudgetMib() {
+  static const auto usual = [] {
+    const long pages = sysconf(_SC_PHYS_PAGES), page_size = sysconf(_SC_PAGE_SIZE);
+    if (pages <= 0 || page_size <= 0) return kUsualMostMib;
+    const uint64_t host_mib = static_cast<uint64_t>(pages) * static_cast<uint64_t>(page_size) >> 20;
+    return std::min(kUsualMostMib, host_mib / 4);
+  }();
+  return usual;
+}
 
 int StopWhenOver(void*) { return WorkLimit::IsOver() ? 1 : 0; }
 
@@ -70,7 +82,7 @@ void WorkLimit::Apply(sqlite3* connection) {
 bool WorkLimit::Hold(size_t bytes) {
   if (!t_work.limited) return true;
   if (t_work.refused != 0) return false;
-  if (bytes > MemoryOfAll() / 2 - t_work.held) {
+  if (bytes > MemoryOfAll() / 2 - std::min(MemoryOfAll() / 2, t_work.held)) {
     t_work.refused = Error::kEngineUserBusy;
   } else if (g_held.fetch_add(bytes) + bytes > MemoryOfAll()) {
     g_held -= bytes;
@@ -92,13 +104,10 @@ void WorkLimit::Require(size_t bytes) {
 }
 
 size_t WorkLimit::MemoryOfAll() {
-  static const auto most = [] {
-    const long pages = sysconf(_SC_PHYS_PAGES), page_size = sysconf(_SC_PAGE_SIZE);
-    const uint64_t host =
-        pages > 0 && page_size > 0 ? static_cast<uint64_t>(pages) * static_cast<uint64_t>(page_size) : kMemoryMost * 8;
-    return static_cast<size_t>(std::min(kMemoryMost, host / 8));
-  }();
-  return most;
+  const uint64_t mib = g_budget_mib != 0 ? g_budget_mib.load() : UsualBudgetMib();
+  return static_cast<size_t>(std::min(mib, kBudgetMostMib) << 20) / 2;
 }
+
+void WorkLimit::SetBudget(uint32_t mib) { g_budget_mib = mib; }
 
 }  // namespace ferrox::engine

@@ -4,6 +4,7 @@
 
 #include <chrono>
 #include <cstddef>
+#include <cstdint>
 
 namespace ferrox::engine {
 
@@ -34,8 +35,11 @@ class WorkLimit {
   static void Release(size_t bytes);
   /// Hold, or Fail.
   static void Require(size_t bytes);
-  /// 256 MiB, or an eighth of the host's memory where that is less.
+  /// Half of the budget for the long lists of searches.
   static size_t MemoryOfAll();
+  /// The budget in MiB. 0, as it is first: a quarter of the host's memory, at most 512. On 32 bits never above 1024.
+  /// Any thread may call; what requests hold already, they keep.
+  static void SetBudget(uint32_t mib);
 };
 
 }  // namespace ferrox::engine
