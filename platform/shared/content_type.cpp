@@ -255,7 +255,7 @@ bool IsMedia(std::string_view type) {
 
 /// Whether a file without any mark cannot be what its name says, but may be text.
 bool IsTextUnderAnotherName(std::string_view type, std::string_view head) {
-  const auto in_no_text = [](char c) { return c >= 0 && c < ' ' && c != '\t' && c != '\n' && c != '\r' && c != '\f'; };
+  const auto in_no_text = [](unsigned char c) { return c < ' ' && c != '\t' && c != '\n' && c != '\r' && c != '\f'; };
   if (IsMedia(type)) return std::none_of(head.begin(), head.end(), in_no_text);
   return IsReadBy({"pdf", "office", "open-document", "book", "old-office", "rich-text"}, type) &&
          head.find('\0') == std::string_view::npos && head.find("%PDF-"sv) == std::string_view::npos;
