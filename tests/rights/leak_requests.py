@@ -12,7 +12,7 @@ CONDITIONS = ("ext:txt", "ext:txt,md", "-ext:txt", "kind:folder", "kind:document
 WORDS = ("{a}", "{a} {b}", "{a} {b} {c}", "\"{a} {b}\"", "{a}*", "{p}*", "\"{a} {p}\"*", "{a} OR {b}", "{a} -{b}",
          "({a} OR {b}) -{c}", "NOT {a}", "{t}", "{t} OR {a}", "-{t}", "{a} -{t}", "{t}*", "{tp}*", "\"{t} {a}\"", "{m}",
          "{m} {a}", "{a} ext:txt", "{a} size:>50", "{a} path:\"{share}/{b}\"", "{a} owner:50001", "{a}{b}", "{a}.{b}",
-         "onceopen", "nowhereword", "once", "past")
+         "onceopen", "nowhereword", "once", "past", "{w}", "{v}", "name:{v} {a}", "*{t}*", "-{v}", "*")
 REFUSED = ("(", "\"{a}", "a*", "OR", "size:many", "date:2018-13", "name:", "{a} OR", "((((((((((((((((({a})", "kind:",
            "x" * 5000, " ".join(["{a}"] * 80))
 PATHS = ("{share}/secret0/0", "{share}/dark", "{share}/secret1", "{share}/nothing", "{share}", "{share}/..", "/etc/passwd",
@@ -29,7 +29,8 @@ def requests(share, own, theirs):
     def search(query, **data):
         a, b, c = rng.sample(own, 3)
         t = rng.choice(theirs)
-        text = query.format(a=a, b=b, c=c, t=t, p=a[:2], tp=t[:3], m=a[:-1] + "x", tm=t[:-1] + "x", share=share)
+        text = query.format(a=a, b=b, c=c, t=t, p=a[:2], tp=t[:3], m=a[:-1] + "x", tm=t[:-1] + "x", share=share,
+                            w=a[0] + "?" + a[2:], v=t[:3] + "*" + t[-1])
         found.append(("search", {"query": text, **data}))
 
     for _ in range(5):

@@ -1,4 +1,3 @@
-#include <algorithm>
 #include <iterator>
 #include <optional>
 #include <string>
@@ -6,7 +5,6 @@
 #include <utility>
 #include <vector>
 
-#include "base/text.h"
 #include "common/error.h"
 #include "services/kovaelasticd/query/field_names.h"
 #include "services/kovaelasticd/query/field_start.h"
@@ -30,11 +28,6 @@ constexpr size_t kValueWordsMax = 6;
 void Require(QueryNode& node) {
   node.required = node.type == QueryNode::Type::kText;
   for (QueryNode& child : node.children) Require(child);
-}
-
-/// Whether mail that is pasted has a line which begins so.
-bool IsHeadOfMail(std::string_view name) {
-  return name == "Date" || name == "From" || name == "To" || name == "Subject" || name == "Sender";
 }
 
 /// Reads the grammar, by recursive descent; a ConditionReader reads the single conditions.
@@ -96,8 +89,7 @@ class Parser {
     QueryNode either(QueryNode::Type::kOr);
     either.children.push_back(ParseAnd());
     while (!cursor_.AtEnd()) {
-      while (cursor_.TakeOr()) {
-      }
+      while (cursor_.TakeOr()) continue;
       said_ += "| ";
       QueryNode next = ParseAnd();
       if (either.children.back().children.empty()) {
@@ -204,40 +196,26 @@ class Parser {
   QueryNode ParseWords() {
     const ConditionValue value = ReadValue();
     said_ += value.phrase ? "| " : value.text + " ";
-    if (value.phrase || cursor_.IsPasted()) return Words(value);
-    HintAtField(value.text);
+    const auto words = [&] { return conditions_.Words(QueryNode::Type::kText, value, cursor_.IsPasted()); };
+    if (value.phrase || cursor_.IsPasted()) {
+      QueryNode node = words();
+      if (value.phrase) Require(node);
+      return node;
+    }
+    HintAt(value.text);
     const std::vector<std::string> alternatives = Alternatives(value.text);
-    if (alternatives.size() == 1) return Words(value);
+    if (alternatives.size() == 1) return words();
     QueryNode either(QueryNode::Type::kOr);
     for (const std::string& word : alternatives) either.children.emplace_back(QueryNode::Type::kText).text = word;
     Require(either);
     return either;
   }
 
-  QueryNode Words(const ConditionValue& value) const {
-    QueryNode node = conditions_.Words(QueryNode::Type::kText, value, cursor_.IsPasted());
-    if (value.phrase) Require(node);
-    return node;
-  }
-
-  /// For "autor:ada", and "Author: ada".
-  void HintAtField(const std::string& word) {
-    const size_t colon = word.find(':');
-    if (colon == std::string::npos) return;
-    const std::string name = word.substr(0, colon);
-    const bool ends = colon + 1 == word.size();
-    const std::string meant = ends ? std::string() : FieldMeantBy(name);
-    if (!meant.empty()) {
-      conditions_.Hint("\"" + name + ":\" is no field, so it is looked for as text; there is " + meant + ":");
-    }
-    if (!ends || !IsFieldName(name)) return;
-    if (cursor_.AtEnd()) {
-      conditions_.Hint("\"" + word + "\" is looked for as text; a field needs a value behind it");
-    } else if (name.front() >= 'A' && name.front() <= 'Z' && !IsHeadOfMail(name)) {
-      const std::string field = base::LowerAscii(name);
-      conditions_.Hint("\"" + word + "\" is looked for as text; to look there alone, write it small, as in " + field +
-                       ":x");
-    }
+  void HintAt(const std::string& word) {
+    const size_t end = cursor_.Position();
+    const std::string hint = HintAtColon(word, cursor_.AtEnd());
+    cursor_.MoveTo(end);
+    if (!hint.empty()) conditions_.Hint(hint);
   }
 
   QueryNode ParseField(const FieldStart& field) {
@@ -263,8 +241,7 @@ class Parser {
 
   /// "name:" without a value, in a query that has more.
   bool IsEmptyWithin(const FieldStart& field, size_t begin) const {
-    const std::string_view text = cursor_.Text();
-    return field.value == text.size() && !WithoutBlanks(text.substr(0, begin)).empty();
+    return field.value == cursor_.Text().size() && !WithoutBlanks(cursor_.Text().substr(0, begin)).empty();
   }
 
   /// A range is read as far as it makes sense: "date:last 3 weeks", "size: > 10 MB".

@@ -1,8 +1,10 @@
 #include "services/kovaelasticd/query/query_words.h"
 
 #include <algorithm>
+#include <iterator>
 
 #include "base/text.h"
+#include "services/kovaelasticd/query/field_names.h"
 #include "services/kovaelasticd/text/pattern.h"
 
 namespace ferrox::engine {
@@ -49,6 +51,11 @@ bool LooksLikeRegularExpression(const std::string& text) {
          (text.size() > 2 && text.front() == '^');
 }
 
+/// Whether mail that is pasted has a line which begins so.
+bool IsHeadOfMail(std::string_view name) {
+  return name == "Date" || name == "From" || name == "To" || name == "Subject" || name == "Sender";
+}
+
 }  // namespace
 
 std::vector<std::string> ExtensionsAsked(std::string_view word) {
@@ -93,6 +100,23 @@ size_t SchemeBytes(std::string_view word) {
     if (lower.starts_with(scheme) && word.size() > scheme.size()) return scheme.size();
   }
   return 0;
+}
+
+std::string HintAtColon(const std::string& word, bool is_last) {
+  const size_t colon = word.find(':');
+  if (colon == std::string::npos) return {};
+  const std::string name = word.substr(0, colon);
+  if (colon + 1 < word.size()) {
+    const std::string meant = FieldMeantBy(name);
+    if (meant.empty()) return {};
+    return "\"" + name + ":\" is no field, so it is looked for as text; there is " + meant + ":";
+  }
+  if (!IsFieldName(name)) return {};
+  const std::string as_text = "\"" + word + "\" is looked for as text; ";
+  if (is_last) return as_text + "a field needs a value behind it";
+  const bool is_capital = name.front() >= 'A' && name.front() <= 'Z';
+  if (!is_capital || IsHeadOfMail(name)) return {};
+  return as_text + "to look there alone, write it small, as in " + base::LowerAscii(name) + ":x";
 }
 
 std::vector<std::string> HintsAtText(const std::string& words) {

@@ -23,6 +23,10 @@ std::string_view BeforeWildcard(std::string_view word);
 /// How many bytes at the front of a URL tell no document from another: "https://", "mailto:".
 size_t SchemeBytes(std::string_view word);
 
+/// What is to be said of a word that was read as text although it has a ":", as "autor:ada" and "Author:"; "" for
+/// nothing. `is_last`: nothing follows.
+std::string HintAtColon(const std::string& word, bool is_last);
+
 /// Sentences about words that are read as text, although they may be meant as conditions: "bigger than 10 MB", "cats
 /// not dogs", "^a.*b$". `words` are parted by single blanks.
 std::vector<std::string> HintsAtText(const std::string& words);

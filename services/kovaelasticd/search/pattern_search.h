@@ -1,8 +1,9 @@
 #pragma once
 
 #include <string>
-#include <vector>
 
+#include "services/kovaelasticd/search/ranked_word.h"
+#include "services/kovaelasticd/search/term_hits.h"
 #include "services/kovaelasticd/store/doc_set.h"
 #include "services/kovaelasticd/store/store_reader.h"
 #include "services/kovaelasticd/store/visible.h"
@@ -17,16 +18,16 @@ namespace ferrox::engine {
 /// that have them. @throws Error kEngineStorage.
 DocSet DocumentsNamedLike(StoreReader& reader, const Visible& visible, const Pattern& pattern);
 
-/// Words of texts that match.
-struct WordsLike {
-  static constexpr size_t kMost = 500;
-  std::vector<std::string> words;  ///< the shortest first; at most kMost
-  bool has_more = false;
-  bool is_known = true;  ///< false: the words of the index are not, so there are none here
+/// A pattern, and as it stands in the query.
+struct TypedPattern {
+  const Pattern& pattern;
+  const std::string& text;
+  bool is_marked;  ///< in snippets
 };
-/// Words that visible documents have, if the pattern is one of words: of letters alone, four of them at least, with
-/// three that are given. @throws Error kEngineStorage.
-WordsLike FindWordsLike(StoreReader& reader, const Visible& visible, const Pattern& pattern);
-bool CanBeWord(const Pattern& pattern);
+/// Finds the words of texts and titles that match, in visible documents; these come into `found`, and what snippets
+/// mark and hints tell of it into `words`. The pattern must be one of words: of letters alone, three of them given. It
+/// stands for the shortest 500 at most. @throws Error kEngineStorage.
+void CollectWordsLike(StoreReader& reader, const Visible& visible, const TypedPattern& typed, TermCollector& found,
+                      FoundWords& words);
 
 }  // namespace ferrox::engine

@@ -19,11 +19,6 @@ namespace {
 
 /// A condition is checked document by document when there are no more of them.
 constexpr int64_t kCheckOneByOneMax = 2000;
-/// Of the words that a pattern stands for: how many are one expression, so many hits of visible documents end it, and
-/// so many of the words are marked in snippets.
-constexpr ptrdiff_t kWordsAtOnce = 32;
-constexpr int64_t kPatternHitsMax = 2000000;
-constexpr size_t kPatternMarksMax = 64;
 
 bool IsWords(QueryNode::Type type) {
   return type == QueryNode::Type::kText || type == QueryNode::Type::kField || type == QueryNode::Type::kName;
@@ -266,7 +261,8 @@ DocSet QueryEvaluator::EvaluatePattern(const QueryNode& node, bool ranking) {
   TermCollector found(database_, visible_, ranking ? hits_max_ : 0);
   const Pattern pattern(node.text);
   found.AddNamed(DocumentsNamedLike(reader_, visible_, pattern));
-  if (node.type == QueryNode::Type::kText) CollectWordsLike(pattern, node.text, ranking, found);
+  if (node.type == QueryNode::Type::kText)
+    CollectWordsLike(reader_, visible_, {pattern, node.text, ranking}, found, found_words_);
   if (ranking) {
     RankedWord& word = found_words_.ranked.emplace_back(RankedWord{pattern.Folded()});
     word.letters = CountLetters(word.word);
@@ -275,31 +271,6 @@ DocSet QueryEvaluator::EvaluatePattern(const QueryNode& node, bool ranking) {
     word.hits = found.TakeHits();
   }
   return found.Set();
-}
-
-void QueryEvaluator::CollectWordsLike(const Pattern& pattern, const std::string& typed, bool ranking,
-                                      TermCollector& found) {
-  const WordsLike like = FindWordsLike(reader_, visible_, pattern);
-  const auto hint = [&](const std::string& sentence) { found_words_.hints.push_back("\"" + typed + "\" " + sentence); };
-  if (!like.is_known) return hint("was looked for in names alone: the words of this index are not at hand");
-  size_t at = 0;
-  while (at < like.words.size() && found.Seen() < kPatternHitsMax) {
-    WorkLimit::Check();
-    const auto begin = like.words.begin() + static_cast<ptrdiff_t>(at);
-    const auto end = begin + std::min<ptrdiff_t>(kWordsAtOnce, like.words.end() - begin);
-    at = static_cast<size_t>(end - like.words.begin());
-    found.Collect(FormOfAny({begin, end}));
-    if (!ranking) continue;
-    for (auto word = begin; word != end && found_words_.marked.size() < kPatternMarksMax; ++word) {
-      found_words_.marked.push_back({*word, false});
-    }
-  }
-  if (like.has_more || at < like.words.size()) {
-    hint("stands for too many words; the " + std::to_string(at) +
-         " shortest were looked for in texts: give more letters");
-  } else if (!CanBeWord(pattern) && typed.find('.') == typed.npos) {
-    hint("was looked for in names alone; in texts a pattern is one word, with three letters at least, such as rep*t");
-  }
 }
 
 void QueryEvaluator::NoteWords(const QueryNode& node) {

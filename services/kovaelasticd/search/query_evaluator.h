@@ -14,7 +14,6 @@
 #include "services/kovaelasticd/store/index_store.h"
 #include "services/kovaelasticd/store/store_reader.h"
 #include "services/kovaelasticd/store/visible.h"
-#include "services/kovaelasticd/text/pattern.h"
 
 namespace ferrox::engine {
 
@@ -53,7 +52,6 @@ class QueryEvaluator {
   DocSet EvaluateAll(const QueryNode& node, bool ranking, bool without_soft = false);
   DocSet EvaluateWords(const QueryNode& node, bool ranking);
   DocSet EvaluatePattern(const QueryNode& node, bool ranking);
-  void CollectWordsLike(const Pattern& pattern, const std::string& typed, bool ranking, TermCollector& found);
   DocSet EvaluateFilter(const QueryNode& node);
   void ApplyFilter(DocSet& documents, const QueryNode& filter, bool wanted);
   bool MatchesFilter(int64_t id, const QueryNode& filter);
