@@ -53,10 +53,12 @@ bool IgnorePatterns::Add(std::string_view text, uint32_t line) {
   if (anchored) {
     anchored_.push_back(number);
   } else if (name.IsPlain()) {
+    plain_begin_ |= name.Begins();
     Note(plain_, name.Literal(), static_cast<int>(number), added.folders_only);
   } else if (name.IsExtension()) {
     Note(extensions_, name.Literal(), static_cast<int>(number), added.folders_only);
   } else {
+    others_begin_ |= name.Begins();
     others_.push_back(number);
   }
   return true;
@@ -104,14 +106,16 @@ IgnorePatterns::State IgnorePatterns::Enter(const State& state, std::string_view
 }
 
 int IgnorePatterns::Match(const State& state, std::string_view name, bool is_folder) const {
-  int last = plain_.empty() ? kNone : Find(plain_, name, is_folder);
+  const auto first = static_cast<unsigned char>(name.empty() ? '\0' : name.front());
+  int last = plain_begin_.test(first) ? Find(plain_, name, is_folder) : kNone;
   const size_t dot = extensions_.empty() ? std::string_view::npos : name.rfind('.');
   if (dot != std::string_view::npos) last = std::max(last, Find(extensions_, name.substr(dot), is_folder));
   const auto matches = [&](uint32_t number, const Segment& segment) {
     const bool counts = static_cast<int>(number) > last && (is_folder || !patterns_[number].folders_only);
     return counts && (segment.any_folders || segment.name.Matches(name));
   };
-  for (auto number = others_.rbegin(); number != others_.rend(); ++number) {
+  const bool may_match = others_begin_.test(first);
+  for (auto number = others_.rbegin(); may_match && number != others_.rend(); ++number) {
     if (static_cast<int>(*number) <= last) break;
     if (matches(*number, patterns_[*number].segments.front())) last = static_cast<int>(*number);
   }

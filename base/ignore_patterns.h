@@ -1,5 +1,6 @@
 #pragma once
 
+#include <bitset>
 #include <cstddef>
 #include <cstdint>
 #include <string>
@@ -84,6 +85,9 @@ class IgnorePatterns {
   ByName plain_;       ///< patterns that are names
   ByName extensions_;  ///< "*.ext", by ".ext"
   std::vector<uint32_t> others_;
+  // With which bytes the names begin that these can match.
+  std::bitset<256> plain_begin_;
+  std::bitset<256> others_begin_;
   std::vector<uint32_t> anchored_;
 };
 

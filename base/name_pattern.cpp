@@ -134,6 +134,13 @@ bool NamePattern::Matches(std::string_view name) const {
   return true;
 }
 
+std::bitset<256> NamePattern::Begins() const {
+  std::bitset<256> begins;
+  const Token first = tokens_.empty() ? Token{Kind::kMany, 0} : tokens_.front();
+  if (first.kind == Kind::kByte) return begins.set(first.value);
+  return first.kind == Kind::kSet ? sets_[first.value] : begins.set();
+}
+
 bool NamePattern::IsExtension() const {
   const bool begins = tokens_.size() > 2 && tokens_[0].kind == Kind::kMany && tokens_[1].value == '.';
   if (!begins || stars_ != 1 || ones_ != 0 || !sets_.empty()) return false;

@@ -19,6 +19,8 @@ class NamePattern {
   bool Read(std::string_view text, size_t& at);
 
   bool Matches(std::string_view name) const;
+  /// With which bytes a name begins that it matches, and maybe with others.
+  std::bitset<256> Begins() const;
   bool Empty() const { return tokens_.empty(); }
   /// Whether it is a name without wildcards; Literal says which.
   bool IsPlain() const { return stars_ == 0 && sets_.empty() && ones_ == 0; }

@@ -29,8 +29,7 @@ bool DiffersFromNameType(const IndexedEntry& indexed, const std::string& path) {
 }  // namespace
 
 bool DocumentWriter::WantsContent(const std::string& path, const struct stat& status) const {
-  return !S_ISDIR(status.st_mode) && folders_.WantsContent(path) &&
-         exclusions_.Of(path, false) == services::Exclusion::kNone;
+  return !S_ISDIR(status.st_mode) && folders_.WantsContent(path) && !exclusions_.HidesContent(path);
 }
 
 bool DocumentWriter::IsCurrent(const IndexedEntry& indexed, const struct stat& status) const {

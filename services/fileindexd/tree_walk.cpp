@@ -175,7 +175,7 @@ void TreeWalk::DropExcluded(Level& level, bool has_ignore_file) const {
     const auto end = item + (is_folder ? 2 : 1);
     const std::string_view name = std::string_view(level.names).substr(item->offset, item->length);
     Place place = Place::kIndexed;
-    if (exclusions->Of(name, is_folder) == services::Exclusion::kLeftOut) {
+    if (exclusions->LeavesOut(name, is_folder)) {
       const std::string path = level.prefix + std::string(name);
       place = is_folder ? rules_.place_of(path) : Place::kOutside;
       if (place == Place::kOnTheWay) level.on_the_way.insert(path);

@@ -41,6 +41,11 @@ bool FolderExclusions::Chooses(const Chain& chain, Exclusion which, std::string_
   return false;
 }
 
+bool FolderExclusions::Is(Exclusion which, std::string_view name, bool is_folder) const {
+  return inherited_ >= which || Chooses(admin_, which, name, is_folder, nullptr) ||
+         Chooses(files_, which, name, is_folder, nullptr);
+}
+
 /// What is chosen by a folder above is chosen, whatever patterns say of it.
 Exclusion FolderExclusions::Decide(std::string_view name, bool is_folder, ExclusionReason* reason) const {
   if (inherited_ == Exclusion::kLeftOut) return inherited_;
@@ -123,6 +128,12 @@ void Exclusions::Forget() {
   const base::MutexLock lock(mutex_);
   by_folder_.clear();
   last_ = nullptr;
+}
+
+bool Exclusions::HidesContent(const std::string& path) {
+  if (!base::IsBelow(path, root_)) return false;
+  const std::string_view folder = base::ParentOf(path);
+  return In(std::string(folder))->HidesContent(std::string_view(path).substr(folder.size() + 1));
 }
 
 /// Goes up to the indexed folder, and down again: the topmost that is chosen decides.

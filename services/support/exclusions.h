@@ -48,6 +48,9 @@ class FolderExclusions {
  public:
   /// Of what lies directly in the folder.
   Exclusion Of(std::string_view name, bool is_folder) const { return Decide(name, is_folder, nullptr); }
+  /// The same as Of(...) == kLeftOut, and >= kNameOnly of what is not left out; each costs half.
+  bool LeavesOut(std::string_view name, bool is_folder) const { return Is(Exclusion::kLeftOut, name, is_folder); }
+  bool HidesContent(std::string_view name) const { return Is(Exclusion::kNameOnly, name, false); }
 
  private:
   friend class Exclusions;
@@ -63,6 +66,7 @@ class FolderExclusions {
   static Chain Entered(const Chain& chain, std::string_view name);
   static bool Chooses(const Chain& chain, Exclusion which, std::string_view name, bool is_folder,
                       ExclusionReason* reason);
+  bool Is(Exclusion which, std::string_view name, bool is_folder) const;
   Exclusion Decide(std::string_view name, bool is_folder, ExclusionReason* reason) const;
 
   Exclusion inherited_ = Exclusion::kNone;
@@ -92,6 +96,8 @@ class Exclusions {
   /// Of a path at or below the root. Looks at no file but ignore files.
   Exclusion Of(const std::string& path, bool is_folder);
   bool LeavesOut(const std::string& path, bool is_folder) { return Of(path, is_folder) == Exclusion::kLeftOut; }
+  /// Whether a file that is not left out has its name alone in the index.
+  bool HidesContent(const std::string& path);
   /// Whether the path is left out whatever it is, a file or a folder.
   bool LeavesOutAll(const std::string& path) { return LeavesOut(path, false) && LeavesOut(path, true); }
   /// Has ignore files read again where they are asked about next.
