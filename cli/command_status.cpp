@@ -1,5 +1,7 @@
 #include <cstdio>
 #include <map>
+#include <memory>
+#include <string>
 
 #include "cli/ask.h"
 #include "cli/command_table.h"
@@ -10,9 +12,11 @@
 #include "cli/output.h"
 #include "cli/share_report.h"
 #include "cli/watching.h"
+#include "common/json_util.h"
 #include "fileindex/folders/folder_mgr.h"
 #include "platform/host/child_service.h"
 #include "platform/host/share_table.h"
+#include "platform/host/synonyms.h"
 #include "services/support/instance_owner.h"
 
 /// The state of the whole instance: the daemons, the supervisor, and each share with indexed folders. Nothing here
@@ -151,7 +155,8 @@ struct Report {
   Json::Value resting;          ///< shares with indexed folders that no worker has (RestingShares)
   std::string folders_problem;  ///< why the list of indexed folders cannot be read, "" when it can
   std::string table_problem;    ///< the same of the table of shares
-  bool has_folders = false;     ///< folders are indexed, which takes more than the engine
+  std::shared_ptr<const kova::host::SynonymList> synonyms = kova::host::GetSynonyms();
+  bool has_folders = false;  ///< folders are indexed, which takes more than the engine
 
   const Json::Value& IndexDaemon() const { return state.index_daemon.status; }
   const Json::Value& NotificationDaemon() const { return state.notification_daemon.status; }
@@ -194,6 +199,7 @@ void PrintAsJson(const Report& report) {
   json["web"] = StatusJson(report.state.web);
   json["supervisor"] = SupervisorJson();
   json["resting_shares"] = report.resting;
+  json["synonym_problems"] = Vec2JsonArr(report.synonyms->problems);
   const std::string& problem = report.folders_problem.empty() ? report.table_problem : report.folders_problem;
   if (!problem.empty()) json["problem"] = problem;
   PrintJson(json);
@@ -214,6 +220,13 @@ void PrintDaemons(const Report& report) {
   }
   PrintDaemon("web daemon", report.state.web, WebText(report.state.web.status));
   PrintSupervisor();
+}
+
+/// Lines of the administrator's list that do not count; the others do, so this is no failure.
+void PrintSynonymProblems(const Report& report) {
+  for (const std::string& problem : report.synonyms->problems) {
+    (void)printf("synonyms: %s: %s\n", kova::host::SynonymsPath().c_str(), EscapeForTerminal(problem).c_str());
+  }
 }
 
 /// First those that a worker has, then those that none has.
@@ -274,6 +287,7 @@ int RunStatus(const Arguments& arguments) {
   if (!report.folders_problem.empty()) {
     (void)printf("indexed folders: %s\n", EscapeForTerminal(report.folders_problem).c_str());
   }
+  PrintSynonymProblems(report);
   PrintShares(report);
   return ExitCodeOf(report);
 }

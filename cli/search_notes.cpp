@@ -40,6 +40,15 @@ std::string RepairedList(const Json::Value& result, bool also) {
   return list + end_of(before);
 }
 
+/// "searched for "car" also as "automobile"".
+void PrintSynonyms(const Json::Value& result) {
+  std::string list;
+  for (const Json::Value& word : result["synonyms"]) {
+    list += (list.empty() ? "" : ", ") + Quoted(word, "from") + " also as " + Quoted(word, "to");
+  }
+  if (!list.empty()) (void)printf("searched for %s\n", list.c_str());
+}
+
 }  // namespace
 
 void PrintHowSearched(const Json::Value& result) {
@@ -47,6 +56,7 @@ void PrintHowSearched(const Json::Value& result) {
   const std::string also = RepairedList(result, true);
   if (!repaired.empty()) (void)printf("searched for %s\n", repaired.c_str());
   if (!also.empty()) (void)printf("also searched for %s\n", also.c_str());
+  PrintSynonyms(result);
   const std::string ignored = WordList(result["ignored"]);
   if (!ignored.empty()) (void)printf("too common to find files by themselves: %s\n", ignored.c_str());
   const std::string some = Count(UintOf(result, "total"));

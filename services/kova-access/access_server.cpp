@@ -2,7 +2,9 @@
 
 #include <unistd.h>
 
+#include <string>
 #include <utility>
+#include <vector>
 
 #include "services/support/json_command.h"
 
@@ -32,6 +34,26 @@ Json::Value JsonOf(const wire::Trust& trust) {
   return json;
 }
 
+Json::Value JsonOf(const std::vector<std::string>& texts) {
+  Json::Value list(Json::arrayValue);
+  for (const std::string& text : texts) list.append(text);
+  return list;
+}
+
+Json::Value JsonOf(const wire::SynonymAnswer& answer) {
+  Json::Value json;
+  json["stamp"] = answer.stamp;
+  if (!answer.rules.has_value()) return json;
+  Json::Value& rules = json["rules"] = Json::Value(Json::arrayValue);
+  for (const wire::SynonymRule& rule : *answer.rules) {
+    Json::Value sides(Json::arrayValue);
+    sides.append(JsonOf(rule.first));
+    sides.append(JsonOf(rule.second));
+    rules.append(std::move(sides));
+  }
+  return json;
+}
+
 Json::Value LookAt(const LiveShare& share, const std::vector<std::string>& paths) {
   Json::Value files(Json::arrayValue);
   for (const std::string& path : paths) files.append(JsonOf(share.Look(path)));
@@ -45,7 +67,7 @@ services::FrameReply AccessServer::Handle(const std::string& request, const serv
   const auto answer = [&](const std::string& type, const Json::Value& data) {
     return Answer(ReadRequest(type, data), descriptor);
   };
-  std::string reply = services::AnswerJsonCommand(request, peer, answer, {"look", "trust"});
+  std::string reply = services::AnswerJsonCommand(request, peer, answer, {"look", "trust", "synonyms"});
   return {std::move(reply), std::move(descriptor)};
 }
 
@@ -57,6 +79,7 @@ Json::Value AccessServer::Answer(const Request& request, base::UniqueFd& descrip
     return data;
   }
   if (request.kind == Request::Kind::kTrust) return JsonOf(trust_());
+  if (request.kind == Request::Kind::kSynonyms) return JsonOf(synonyms_(request.known));
   const services::OpenLimit::Turn turn(limit_, request.root);
   RunAsUser(request.user, [&] {
     const LiveShare share(own_descriptors_, request.root);

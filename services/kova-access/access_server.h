@@ -10,18 +10,23 @@
 #include "services/kova-access/request.h"
 #include "services/support/frame_server.h"
 #include "services/support/open_limit.h"
+#include "wire/synonyms.h"
 #include "wire/trust.h"
 
 namespace ferrox::access {
 
-/// Answers what a user may open, and whom the settings trust (docs/formats/access.md). Any thread may call it; it
-/// blocks for as long as the file system asked for does.
+/// Answers what a user may open, whom the settings trust, and which words mean the same (docs/formats/access.md). Any
+/// thread may call it; it blocks for as long as the file system asked for does.
 class AccessServer {
  public:
-  /// `trust` reads the settings of now; any thread calls it.
+  using ReadTrust = std::function<wire::Trust()>;
+  using ReadSynonyms = std::function<wire::SynonymAnswer(const std::string& known)>;
+
+  /// Those two read the settings of now, as wire/trust.h and wire/synonyms.h say; any thread calls them.
   explicit AccessServer(
-      const services::OpenLimit::Options& limit, std::function<wire::Trust()> trust = [] { return wire::Trust(); })
-      : limit_(limit), trust_(std::move(trust)) {}
+      const services::OpenLimit::Options& limit, ReadTrust trust = [] { return wire::Trust(); },
+      ReadSynonyms synonyms = [](const auto&) { return wire::SynonymAnswer(); })
+      : limit_(limit), trust_(std::move(trust)), synonyms_(std::move(synonyms)) {}
 
   services::FrameReply Handle(const std::string& request, const services::Peer& peer);
 
@@ -30,7 +35,8 @@ class AccessServer {
 
   const OwnDescriptors own_descriptors_;
   services::OpenLimit limit_;
-  const std::function<wire::Trust()> trust_;
+  const ReadTrust trust_;
+  const ReadSynonyms synonyms_;
 };
 
 }  // namespace ferrox::access

@@ -3,12 +3,15 @@
 #include <cstdio>
 #include <cstring>
 #include <exception>
+#include <memory>
 #include <optional>
+#include <string>
 #include <utility>
 
 #include <kova/log.h>
 
 #include "common/paths.h"
+#include "platform/host/synonyms.h"
 #include "platform/host/trusted_clients.h"
 #include "services/kova-access/access_server.h"
 #include "services/support/daemon.h"
@@ -41,12 +44,17 @@ wire::Trust ReadTrust() {
   return {std::move(clients.uids), clients.least_user, std::move(clients.ended), clients.memory_mib};
 }
 
+wire::SynonymAnswer ReadSynonyms(const std::string& known) {
+  const std::shared_ptr<const kova::host::SynonymList> list = kova::host::GetSynonyms();
+  return {list->stamp, list->stamp == known ? std::nullopt : std::optional(list->rules)};
+}
+
 void Serve() {
   services::Daemon daemon("kova-access");
   services::OpenLimit::Options limit;
   limit.at_once = kAtOnce;
   limit.root_at_once = kRootAtOnce;
-  access::AccessServer access_server(limit, &ReadTrust);
+  access::AccessServer access_server(limit, &ReadTrust, &ReadSynonyms);
   services::FrameServerOptions options;
   options.socket_path = InstancePath(kAccessSocket);
   options.request_limit_bytes = kRequestMaxBytes;

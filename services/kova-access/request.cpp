@@ -38,6 +38,7 @@ User ReadUser(const Json::Value& data) {
 Request::Kind ReadKind(const std::string& type) {
   if (type == "status") return Request::Kind::kStatus;
   if (type == "trust") return Request::Kind::kTrust;
+  if (type == "synonyms") return Request::Kind::kSynonyms;
   FERROX_FAIL_IF(type != "look" && type != "open", Error::kBadArgument, "unknown command " + type);
   return type == "look" ? Request::Kind::kLook : Request::Kind::kOpen;
 }
@@ -45,9 +46,14 @@ Request::Kind ReadKind(const std::string& type) {
 }  // namespace
 
 Request ReadRequest(const std::string& type, const Json::Value& data) {
-  Request request{ReadKind(type), {}, {}, {}};
+  Request request{ReadKind(type), {}, {}, {}, {}};
   if (request.kind == Request::Kind::kStatus || request.kind == Request::Kind::kTrust) return request;
   FERROX_FAIL_IF(!data.isObject(), Error::kBadArgument, "\"data\" is no object");
+  if (request.kind == Request::Kind::kSynonyms) {
+    FERROX_FAIL_IF(!data["known"].isString(), Error::kBadArgument, "\"known\" is no text");
+    request.known = data["known"].asString();
+    return request;
+  }
   request.user = ReadUser(data);
   request.root = ReadPath(data["root"]);
   if (request.kind == Request::Kind::kOpen) {

@@ -1,7 +1,11 @@
 #include <malloc.h>
+#include <unistd.h>
 
 #include <cstdio>
 #include <cstring>
+#include <memory>
+#include <optional>
+#include <string>
 #include <utility>
 
 #include <kova/log.h>
@@ -10,15 +14,18 @@
 #include "common/error.h"
 #include "common/paths.h"
 #include "platform/host/account_lookup.h"
+#include "platform/host/synonyms.h"
 #include "services/kovaelasticd/commands/caller.h"
 #include "services/kovaelasticd/commands/engine.h"
 #include "services/kovaelasticd/commands/live_look.h"
 #include "services/kovaelasticd/commands/named_users.h"
+#include "services/kovaelasticd/commands/synonyms_of_settings.h"
 #include "services/kovaelasticd/commands/trust_of_settings.h"
 #include "services/kovaelasticd/commands/user_limits.h"
 #include "services/kovaelasticd/own_user.h"
 #include "services/support/daemon.h"
 #include "services/support/frame_server.h"
+#include "services/support/instance_owner.h"
 
 namespace {
 
@@ -36,6 +43,15 @@ void KeepMemoryForSearches() {
   (void)mallopt(M_TRIM_THRESHOLD, 16 << 20);
 }
 
+/// Who owns the instance may read its settings; for others kova-access does.
+std::optional<ferrox::wire::SynonymAnswer> ReadSynonyms(const std::string& known) {
+  if (ferrox::services::InstanceOwner() != geteuid()) return ferrox::engine::AskForSynonyms(known);
+  const std::shared_ptr<const kova::host::SynonymList> list = kova::host::GetSynonyms();
+  ferrox::wire::SynonymAnswer answer{list->stamp};
+  if (list->stamp != known) answer.rules = list->rules;
+  return answer;
+}
+
 void Serve() {
   using namespace ferrox;
   constexpr uint32_t kRequestMaxBytes = 256U << 20;
@@ -47,8 +63,10 @@ void Serve() {
     throw Error(Error::kInternal, "cannot make the folder " + state_folder);
   }
   engine::TrustOfSettings trust;
+  engine::SynonymsOfSettings synonyms(&ReadSynonyms);
   engine::Engine engine(state_folder, &engine::LookOnDisk,
-                        {[&trust] { return trust.Get(); }, &kova::host::LookUpAccount});
+                        {[&trust] { return trust.Get(); }, &kova::host::LookUpAccount},
+                        [&synonyms] { return synonyms.Get(); });
   services::FrameServerOptions options;
   options.socket_path = engine::OwnSocketPath();
   options.socket_mode = engine.InstanceOwner() == 0 ? 0666 : 0660;  // else nobody but its owner is answered

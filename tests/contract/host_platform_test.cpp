@@ -20,6 +20,7 @@
 
 #include "platform/host/account_source.h"
 #include "platform/host/share_table.h"
+#include "platform/host/synonyms.h"
 #include "tests/contract/in_child.h"
 #include "tests/support/temp_dir.h"
 
@@ -113,6 +114,28 @@ TEST_F(HostPlatformTest, TheTableIsReadAgainWhenSomebodyElseChangesIt) {
     EXPECT_NE(string::npos, Refusal("c", Folder("c")).find(ShareTablePath())) << bad.substr(0, 80);
     EXPECT_EQ(bad, ReadFile(ShareTablePath())) << "a table that cannot be read must not be replaced";
   }
+}
+
+TEST_F(HostPlatformTest, BadLinesOfTheSynonymsLeaveTheOthersWorking) {
+  const auto told = [](const string& text) {
+    WriteFile(kova::host::SynonymsPath(), text);
+    const std::shared_ptr<const kova::host::SynonymList> list = kova::host::GetSynonyms();
+    string read = std::to_string(list->rules.size());
+    for (const string& problem : list->problems) read += "; " + problem;
+    return read;
+  };
+  EXPECT_EQ("0", told(""));
+  EXPECT_EQ(
+      "2; line 3 has one word alone; line 4 lacks the words on one side of \"=>\"; line 5 lacks a word beside a comma;"
+      " line 6 is not text in UTF-8; line 7 has more than one \"=>\"; line 8 has a word without a letter",
+      told("# cars\ncar, automobile,auto # equal\none\n => tv\na,,b\n\xFF, b\na => b => c\n-, b\r\n\ttv=>hard disk "
+           "\r\n"));
+  const kova::host::SynonymList two = kova::host::ReadSynonyms("tv => television, big tv");
+  EXPECT_EQ(kova::host::SynonymRule({"tv"}, {"television", "big tv"}), two.rules.at(0));
+  string many;
+  for (int i = 0; i < 1001; ++i) many += "a, b\n";
+  EXPECT_EQ("1000; line 1001 and what follows do not count: a list has at most 1,000 lines", told(many));
+  EXPECT_EQ("0; the file has more than 64 KiB", told(string(65537, '#')));
 }
 
 TEST_F(HostPlatformTest, ARenamedOrMovedShareKeepsItsFlags) {

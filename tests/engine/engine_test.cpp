@@ -294,6 +294,23 @@ TEST_F(EngineTest, LostChangesFailTheNextCommit) {
   EXPECT_EQ(Commit("a"), 0) << "said once";
 }
 
+TEST_F(EngineTest, SynonymsAreToldWhereTheyWereNeededAndWhenAsked) {
+  const auto synonyms = std::make_shared<const Synonyms>(std::vector<Synonyms::Rule>{{{"car"}, {"automobile"}}});
+  engine_.reset();
+  engine_ = std::make_unique<Engine>(folder_ / "state", &LookOnDisk, UserSources(), [synonyms] { return synonyms; });
+  ASSERT_EQ(Create("a", "a") + Put("a", "/v/a/1", "an automobile"), 0);
+  const auto told = [this](const std::string& members) {
+    EXPECT_EQ(Commit("a"), 0);
+    return toString(Send("search", R"({"query":"car")" + members + "}")["data"]["synonyms"]);
+  };
+  EXPECT_EQ(told(""), R"([{"from":"car","to":"automobile"}])");
+  ASSERT_EQ(Put("a", "/v/a/2", "a car"), 0);
+  EXPECT_EQ(told(""), "null");
+  EXPECT_EQ(told(R"(,"explain":true)"), R"([{"also":true,"from":"car","to":"automobile"}])");
+  ASSERT_EQ(Put("a", "/v/a/1", "nothing"), 0);
+  EXPECT_EQ(told(R"(,"explain":true)"), "null");
+}
+
 TEST_F(EngineTest, SearchMergesIndicesAndPages) {
   for (const std::string id : {"a", "b"}) {
     ASSERT_EQ(Create(id, id), 0);

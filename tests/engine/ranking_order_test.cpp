@@ -19,7 +19,7 @@ struct Ranked {
 };
 
 constexpr char kNotFound[] = "-";
-constexpr int kFillers = 40;
+constexpr int kFillers = 60;
 /// What texts of one line go on with, so that they have a language, and no title.
 const std::string kRest =
     " was seen by the people who live in the old house on the hill, which they had built after the great war, and so"
@@ -85,6 +85,16 @@ const Ranked kRules[] = {
      {{"/v/z", "lantern"}, {kNotFound, ""}, {"/v/a", "filler"}}},
     {"but it counts", "filler lantern", {{"/v/z", "lantern, filler"}, {"/v/a", "lantern, fuller"}}},
     {"an umlaut written out comes behind the word as typed", "mueller", {{"/v/z", "Mueller"}, {"/v/a", "Müller"}}},
+    {"a synonym comes behind the word itself", "car", {{"/v/z", "a car"}, {"/v/a", "an automobile"}}},
+    {"forms of a synonym count", "car red", {{"/v/z", "red automobiles"}, {"/v/a", "red bridges"}}},
+    {"a synonym may be a phrase, and stand for one",
+     "hard disk",
+     {{"/v/z", "a hard disk"}, {"/v/a", "a drive"}, {kNotFound, ""}, {"/v/b", "a motor"}}},
+    {"it holds one way", "drive", {{"/v/z", "a drive"}, {kNotFound, ""}, {"/v/a", "a hard disk"}}},
+    {"a required word has none", "+car", {{"/v/z", "a car"}, {kNotFound, ""}, {"/v/a", "an automobile"}}},
+    {"a synonym that nearly all have does not drown the word",
+     "rare harbour",
+     {{"/v/z", "rare"}, {"/v/a", "harbour"}, {kNotFound, ""}, {"/v/b", "no"}}},
     {"a code grouped otherwise is found",
      "AB1234/5",
      {{"/v/a", "file AB-1234/5"}, {kNotFound, ""}, {"/v/b", "file AB 1235"}}},
@@ -115,11 +125,15 @@ class RankingOrderTest : public testing::Test {
     store_.Upsert(path, FileDocument(path, text.find('\n') == text.npos ? text + kRest : text, mtime));
   }
   std::string Found(const char* query) {
-    SearchReply reply = Find(store_, query);
+    SearchRequest request;
+    request.synonyms = &synonyms_;
+    SearchReply reply = Find(store_, query, request);
     std::erase_if(reply.hits, [](const SearchHit& hit) { return hit.is_folder; });
     return Paths(reply, false);
   }
 
+  const Synonyms synonyms_{
+      {{{"Car", "automobile"}, {"automobile", "car"}}, {{"hard disk"}, {"drive"}}, {{"rare"}, {"filler"}}}};
   test::TempDir folder_;
   SqliteStore store_{folder_ / "index.sqlite", true, PlainSchema()};
 };

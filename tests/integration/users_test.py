@@ -259,6 +259,10 @@ esac
         self.assertEqual([ENGINE.uid] * 4 + [0] * 6, list(owners.values()), owners)
         self.assertEqual("0000000000000000", process_facts(self.instance.pid("kovaelasticd"))["CapPrm"])
         self.assertIn("a.txt", self.found(ANN, "lantern"))
+        # The administrator's synonyms, which the engine may not read itself.
+        write(f"{root}/etc/kova/synonyms.conf", "alone\ntorch => lantern\n")
+        wait_for(lambda: "a.txt" in self.found(ANN, "torch"), "the synonyms")
+        self.assertIn("synonyms.conf: line 1 has one word alone", self.ctl("status").decode())
         for daemon, kind, code in (("fileindexd", "status", None), ("fileindexd", "pause", 1406), ("kovanotifyd", "sync", None),
                                    ("kovanotifyd", "status", 1406), ("kova-access", "trust", None), ("kova-access", "open", 1406)):
             request = {"type": kind, "data": {}}

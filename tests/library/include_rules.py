@@ -47,16 +47,16 @@ EXCEPTIONS = {
     # The daemons' main functions know the host that they run on: its table of shares, its registry, its services.
     "services/fileindexd/main.cpp": ["platform/host/samba_shares.h", "platform/host/share_search.h",
                                      "platform/host/mounts.h", "platform/host/exclusion_settings.h"],
-    "services/kovaelasticd/main.cpp": ["platform/host/account_lookup.h"],
-    "services/kova-access/main.cpp": ["platform/host/trusted_clients.h"],
+    "services/kovaelasticd/main.cpp": ["platform/host/account_lookup.h", "platform/host/synonyms.h"],
+    "services/kova-access/main.cpp": ["platform/host/synonyms.h", "platform/host/trusted_clients.h"],
     "services/kovanotifyd/main.cpp": ["platform/host/configuration.h", "platform/host/notify_registry.h"],
     "services/kovawebd/main.cpp": ["platform/host/configuration.h"],
     "services/supervisor/main.cpp": ["platform/host/service_log.h", "platform/host/child_service.h"],
 }
-# The tool keeps the table of shares, tells what is wrong in it or why a service did not start, knows mount points, and
-# shows what is left out.
+# The tool keeps the table of shares, tells what is wrong in it, in the synonyms or why a service did not start, knows
+# mount points, and shows what is left out.
 TOOL_MAY = {f"platform/host/{name}.h" for name in ("share_table", "share_rules", "mounts", "child_service",
-                                                    "exclusion_settings")}
+                                                    "exclusion_settings", "synonyms")}
 
 
 def room_of(path):

@@ -1,5 +1,7 @@
 #pragma once
 
+#include <functional>
+#include <memory>
 #include <span>
 #include <string>
 
@@ -10,6 +12,7 @@
 #include "services/kovaelasticd/commands/live_look.h"
 #include "services/kovaelasticd/commands/named_users.h"
 #include "services/kovaelasticd/indices/registry.h"
+#include "services/kovaelasticd/query/synonyms.h"
 
 namespace ferrox::engine {
 
@@ -17,11 +20,16 @@ namespace ferrox::engine {
 /// helpers of members.h, which refuse what is missing or of another type by naming it, and does its work through the
 /// registry.
 
+/// The synonyms of now, for one search.
+using SynonymsFunction = std::function<std::shared_ptr<const Synonyms>()>;
+inline std::shared_ptr<const Synonyms> NoSynonyms() { return nullptr; }
+
 /// One command of a request.
 struct CommandCall {
   Registry& registry;
   const Caller& caller;
   const LookFunction& look;
+  const SynonymsFunction& synonyms;
   DaemonRelay& relay;
   Json::Value& data;             ///< the request's "data", an object; the command may move values out of it
   NamedUserPtr named = nullptr;  ///< for whom "as" asks by name

@@ -117,10 +117,11 @@ Json::Value SuccessReply(Json::Value data) {
   return reply;
 }
 
-Engine::Engine(const std::string& state_folder, LookFunction look, UserSources users)
+Engine::Engine(const std::string& state_folder, LookFunction look, UserSources users, SynonymsFunction synonyms)
     : registry_(state_folder),
       instance_owner_(OwnerOfInstance()),
       look_(std::move(look)),
+      synonyms_(std::move(synonyms)),
       users_(std::move(users), instance_owner_) {}
 
 std::string Engine::Handle(const std::string& request, const services::Peer& peer) {
@@ -178,7 +179,7 @@ NamedUserPtr Engine::NamedBy(const Command& command, const Caller& caller, const
 
 /// Who asks as an ordinary user is told of failures what that user is.
 Json::Value Engine::Run(const Command& command, const Caller& caller, Json::Value& part) {
-  CommandCall call{registry_, caller, look_, relay_, DataOf(part)};
+  CommandCall call{registry_, caller, look_, synonyms_, relay_, DataOf(part)};
   const bool as_user = command.users != Users::kPrivileged && !call.data["as"].isNull();
   try {
     call.named = NamedBy(command, caller, call.data);

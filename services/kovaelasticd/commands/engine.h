@@ -25,9 +25,10 @@ class Engine {
  public:
   static constexpr std::chrono::milliseconds kStep{5};
 
-  /// Loads the indices that are noted in `state_folder`. `look` and `users` are called by any thread. @throws Error
-  /// kInternal.
-  explicit Engine(const std::string& state_folder, LookFunction look = &LookOnDisk, UserSources users = {});
+  /// Loads the indices that are noted in `state_folder`. `look`, `users` and `synonyms` are called by any thread.
+  /// @throws Error kInternal.
+  explicit Engine(const std::string& state_folder, LookFunction look = &LookOnDisk, UserSources users = {},
+                  SynonymsFunction synonyms = &NoSynonyms);
 
   /// One request to one reply, whatever the request holds. What an ordinary user is told leaves at the next full kStep
   /// since the call, so that its time tells less of what others have.
@@ -50,6 +51,7 @@ class Engine {
   Registry registry_;
   const uint32_t instance_owner_;
   const LookFunction look_;
+  const SynonymsFunction synonyms_;
   NamedUsers users_;
   DaemonRelay relay_{registry_};
 };

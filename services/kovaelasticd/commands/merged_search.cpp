@@ -107,6 +107,7 @@ MergedReply AddUp(std::vector<IndexReply>& replies) {
     std::move(reply.suggestions.begin(), reply.suggestions.end(), std::back_inserter(merged.suggestions));
     std::move(reply.hints.begin(), reply.hints.end(), std::back_inserter(merged.hints));
     MergeRepaired(merged.repaired, std::move(reply.repaired));
+    MergeRepaired(merged.synonyms, std::move(reply.synonyms));
     if (reply.total == 0) continue;
     if (none_found) merged.ignored = std::move(reply.ignored);
     std::erase_if(merged.ignored, [&](const std::string& word) {
@@ -140,6 +141,7 @@ MergedReply SearchIndices(std::vector<AskedIndex>& indices, const SearchRequest&
   std::vector<IndexReply> replies = AskAll(indices, each, leave_out);
   DropPoorSubstitutes(replies);
   MergedReply merged = AddUp(replies);
+  if (!request.explain) std::erase_if(merged.synonyms, [](const RepairedWord& word) { return word.also; });
   std::vector<std::vector<IndexHit>> of_index;
   of_index.reserve(replies.size());
   for (IndexReply& of : replies) of_index.push_back(HitsOf(of));

@@ -35,6 +35,7 @@ struct MergedReply {
   bool none_has_all = false;
   std::vector<std::string> ignored;      ///< words that find none by themselves in any index where anything was found
   std::vector<RepairedWord> repaired;    ///< of each index, each once
+  std::vector<RepairedWord> synonyms;    ///< likewise; unless hits are explained, only where a word itself finds none
   std::vector<IndexHit> hits;            ///< the page
   std::vector<std::string> suggestions;  ///< of each index, each once
   std::vector<std::string> hints;        ///< likewise

@@ -30,6 +30,7 @@ void AddTotalsAndWords(Json::Value& result, const MergedReply& found, const std:
   if (found.total_all.has_value()) result["total_all"] = Json::Int64(*found.total_all);
   if (!found.ignored.empty()) result["ignored"] = Vec2JsonArr(found.ignored);
   for (const RepairedWord& word : found.repaired) result["repaired"].append(RepairedJson(word));
+  for (const RepairedWord& word : found.synonyms) result["synonyms"].append(RepairedJson(word));
   if (found.none_has_all) result["none_has_all"] = true;
   if (found.total == 0 && !found.suggestions.empty()) result["suggestions"] = Vec2JsonArr(found.suggestions);
   for (const std::vector<std::string>* hints : {&query_hints, &found.hints}) {

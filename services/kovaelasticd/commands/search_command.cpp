@@ -1,6 +1,7 @@
 #include <algorithm>
 #include <chrono>
 #include <iterator>
+#include <memory>
 #include <optional>
 #include <utility>
 
@@ -107,6 +108,8 @@ Json::Value RunSearch(CommandCall& call) {
   query.tree = ParseQuery(RequiredText(call.data, "query"), Clock::Get().Now(), &query.hints);
   request.query = &query.tree;
   if (request.sort == SortKey::kRelevance && !HasWords(query.tree)) request.sort = SortKey::kDate;
+  const std::shared_ptr<const Synonyms> synonyms = call.synonyms();
+  request.synonyms = synonyms.get();
   const std::optional<Asker> asker = AskerOf(call.caller, call.data, call.named);
   Json::Value result =
       asker.has_value() ? SearchForUser(call, *asker, request, query) : SearchEverything(call, request, query);

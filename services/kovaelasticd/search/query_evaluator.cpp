@@ -81,8 +81,12 @@ FoundDocuments QueryEvaluator::FindSoftly(const QueryNode& query, const std::vec
     found.ignored = soft_.Ignored();
   }
   found.repaired = soft_.Repaired();
+  found.synonyms = soft_.UsedSynonyms();
   for (RankedWord& word : soft_.TakeRanked()) {
     for (const std::string& other : word.repairs) found_words_.marked.push_back({other, false});
+    for (const std::string& other : word.related) {
+      for (const std::string& part : SplitQueryText(other, false).words) found_words_.marked.push_back({part, false});
+    }
     found_words_.ranked.push_back(std::move(word));
   }
   return found;

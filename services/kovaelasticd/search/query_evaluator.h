@@ -21,8 +21,9 @@ namespace ferrox::engine {
 struct FoundDocuments {
   DocSet documents;
   std::optional<DocSet> with_all;    ///< of these, those with all words; nothing where all have them
-  std::vector<std::string> ignored;  ///< as in SearchReply, like the next two
+  std::vector<std::string> ignored;  ///< as in SearchReply, like the next three
   std::vector<RepairedWord> repaired;
+  std::vector<RepairedWord> synonyms;
   bool none_has_all = false;
 };
 
@@ -31,14 +32,15 @@ struct FoundDocuments {
 class QueryEvaluator {
  public:
   /// `hits_max`: of how many documents each word's hits are kept for ranking (HitCollector); the sets are complete in
-  /// any case. Nothing that is not `visible` is found, or counts. All must outlive this.
-  QueryEvaluator(StoreReader& reader, const Visible& visible, size_t hits_max, const RankingConstants& constants)
+  /// any case. Nothing that is not `visible` is found, or counts. All must outlive this; `synonyms` may be null.
+  QueryEvaluator(StoreReader& reader, const Visible& visible, size_t hits_max, const RankingConstants& constants,
+                 const Synonyms* synonyms)
       : reader_(reader),
         database_(reader.database),
         visible_(visible),
         hits_max_(hits_max),
         constants_(constants),
-        soft_(reader, visible, hits_max, constants) {}
+        soft_(reader, visible, hits_max, constants, synonyms) {}
 
   /// `all_words`: documents must have all words, unless there is none that does. To be called once.
   /// @throws Error kEngineStorage.

@@ -25,6 +25,7 @@ struct RankingConstants {
   // Other forms of a word, as a share of what the word itself is worth.
   double stem = 0.6;
   double spelling = 0.9;
+  double synonym = 0.8;
 
   // A word that a repair goes beside (SearchReply::repaired with `also`): what the word as it was typed adds at least,
   // and what a repaired one adds at most. So the former come first.

@@ -7,6 +7,7 @@
 
 #include "services/kovaelasticd/search/folder_words.h"
 #include "services/kovaelasticd/search/repair.h"
+#include "services/kovaelasticd/search/synonym_words.h"
 #include "services/kovaelasticd/store/work_limit.h"
 #include "services/kovaelasticd/text/words.h"
 
@@ -16,6 +17,8 @@ namespace {
 
 /// A word in no more documents than that may be a misspelling.
 constexpr int64_t kRepairedDocumentsMax = 2;
+/// So many documents may have another word that a word finds, too, however few there are in all.
+constexpr int64_t kNeverCommon = 50;
 /// Of a common word, so many documents are asked for one by one; for more, walking through all that have it costs less.
 constexpr int64_t kAskOneByOneMax = 100;
 
@@ -98,6 +101,7 @@ void SoftWords::Find(const std::vector<const QueryNode*>& nodes, bool rare_besid
     word.is_ignored = word.found->HasStopped();
     word.is_common = !word.is_ignored && IsCommon(word.found->Documents());
   }
+  FindSynonyms(nodes);
   LookForRepairs();
   const auto is_rare = [](const Word& word) {
     return !word.is_ignored && !word.is_common && word.found->Documents() > 0;
@@ -124,6 +128,36 @@ void SoftWords::FindSpellings(Word& word) const {
   const std::vector<WordForm> spellings = SpellingForms(single, constants_);
   word.found->Collect(spellings);
   word.forms.insert(word.forms.end(), spellings.begin(), spellings.end());
+}
+
+void SoftWords::FindSynonyms(const std::vector<const QueryNode*>& nodes) {
+  if (synonyms_ == nullptr || synonyms_->IsEmpty()) return;
+  std::vector<std::string> singles;
+  for (const QueryNode* node : nodes) singles.push_back(SingleWord(*node));
+  const std::vector<SynonymOfWord> synonyms = SynonymsIn(singles, *synonyms_);
+  for (Word& word : words_) {
+    if (word.is_ignored) continue;
+    const bool has_own = word.found->Documents() > 0;
+    for (const SynonymOfWord& synonym : synonyms) {
+      if (singles[synonym.of] != SingleWord(*word.node)) continue;
+      if (!TakeRelated(word, synonym.shown, FormsOf(synonym.words, constants_), constants_.synonym)) continue;
+      used_synonyms_.push_back({synonym.from, synonym.shown, has_own});
+    }
+  }
+}
+
+/// Adds what is found of another word by a share of its worth. False where that is nothing, or so much that the word
+/// would not be rare any more.
+bool SoftWords::TakeRelated(Word& word, const std::string& shown, const std::vector<WordForm>& forms, double share) {
+  WorkLimit::Check();
+  TermCollector found(reader_.database, visible_, hits_max_);
+  found.StopAfter(word.is_common ? WalkedMax() : std::max(kNeverCommon, CommonMax()));
+  found.Collect(forms);
+  if (found.HasStopped() || found.Documents() == 0) return false;
+  word.related.push_back(shown);
+  word.found->AddRelated(found, share, static_cast<uint8_t>(word.related.size()), constants_);
+  word.forms.insert(word.forms.end(), forms.begin(), forms.end());
+  return true;
 }
 
 void SoftWords::LookForRepairs() {
@@ -236,6 +270,7 @@ std::vector<RankedWord> SoftWords::TakeRanked() {
     taken.folders = std::move(word.folders);
     taken.own_first = word.own_first;
     taken.repairs = std::move(word.repairs);
+    taken.related = std::move(word.related);
     taken.phrases = PhrasesOf(word.forms);
   }
   return ranked;

@@ -7,6 +7,7 @@
 #include <vector>
 
 #include "services/kovaelasticd/query/query.h"
+#include "services/kovaelasticd/query/synonyms.h"
 #include "services/kovaelasticd/search/ranked_word.h"
 #include "services/kovaelasticd/search/term_hits.h"
 #include "services/kovaelasticd/store/doc_set.h"
@@ -23,9 +24,10 @@ namespace ferrox::engine {
 /// What is in no visible document, or hardly in any, is looked for as what was probably meant, too (RepairWords).
 class SoftWords {
  public:
-  /// `hits_max` as in HitCollector. All must outlive this.
-  SoftWords(StoreReader& reader, const Visible& visible, size_t hits_max, const RankingConstants& constants)
-      : reader_(reader), visible_(visible), hits_max_(hits_max), constants_(constants) {}
+  /// `hits_max` as in HitCollector; `synonyms` may be null. All must outlive this.
+  SoftWords(StoreReader& reader, const Visible& visible, size_t hits_max, const RankingConstants& constants,
+            const Synonyms* synonyms)
+      : reader_(reader), visible_(visible), hits_max_(hits_max), constants_(constants), synonyms_(synonyms) {}
 
   /// Looks for the words; `rare_beside`: a required one that is rare stands beside them.
   /// @throws Error kEngineStorage, as all that follow.
@@ -41,6 +43,7 @@ class SoftWords {
   /// The words that find none by themselves.
   std::vector<std::string> Ignored() const;
   const std::vector<RepairedWord>& Repaired() const { return repaired_; }
+  const std::vector<RepairedWord>& UsedSynonyms() const { return used_synonyms_; }
   /// Hands the words that score over.
   std::vector<RankedWord> TakeRanked();
 
@@ -56,6 +59,7 @@ class SoftWords {
     bool is_common = false;  ///< not ignored, but admits no document
     bool own_first = false;  ///< repairs go beside it
     std::vector<std::string> repairs = {};
+    std::vector<std::string> related = {};
   };
 
   /// A word to be looked for; `group`: the first of the words that it may be one number or code with, else null.
@@ -71,6 +75,8 @@ class SoftWords {
   int64_t WalkedMax() const { return std::max(CommonMax(), constants_.common_scored_max); }
   std::vector<bool> Rarest(const std::vector<Wanted>& wanted);
   void FindSpellings(Word& word) const;
+  void FindSynonyms(const std::vector<const QueryNode*>& nodes);
+  bool TakeRelated(Word& word, const std::string& shown, const std::vector<WordForm>& forms, double share);
   void LookForRepairs();
   void TakeRepair(Word& word, const std::string& other, double likelihood);
   void FindElsewhere(Word& word);
@@ -81,8 +87,10 @@ class SoftWords {
   const Visible& visible_;
   const size_t hits_max_;
   const RankingConstants& constants_;
+  const Synonyms* const synonyms_;
   std::vector<Word> words_;
   std::vector<RepairedWord> repaired_;
+  std::vector<RepairedWord> used_synonyms_;
 };
 
 }  // namespace ferrox::engine

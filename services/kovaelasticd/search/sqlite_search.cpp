@@ -67,13 +67,14 @@ SearchReply Searcher::Run() {
     return reply;
   }
   const bool by_relevance = request_.sort == SortKey::kRelevance;
-  QueryEvaluator evaluator(reader_, visible_, by_relevance ? request_.ranked_max : 0, constants_);
+  QueryEvaluator evaluator(reader_, visible_, by_relevance ? request_.ranked_max : 0, constants_, request_.synonyms);
   FoundDocuments found = evaluator.Find(*request_.query, request_.all_words || !by_relevance);
   SearchReply reply;
   reply.total = found.documents.Count();
   if (found.with_all.has_value()) reply.total_all = found.with_all->Count();
   reply.ignored = std::move(found.ignored);
   reply.repaired = std::move(found.repaired);
+  reply.synonyms = std::move(found.synonyms);
   reply.none_has_all = found.none_has_all;
   reply.hints = evaluator.Words().hints;
   PutPage(found, evaluator.Words(), reply);

@@ -76,27 +76,38 @@ void TermCollector::AddNamed(const DocSet& documents) {
   by_name_parts_.UniteWith(documents);
 }
 
-void TermCollector::AddRepaired(const TermCollector& other, double likelihood, const RankingConstants& constants) {
+/// Calls `mark` for hits of documents that had nothing of the word.
+template <typename Mark>
+void TermCollector::AddOther(const TermCollector& other, double share, const RankingConstants& constants, Mark&& mark) {
   Merge(other.hits_, [&](TermHit& hit, const TermHit& found) {
     const bool is_new = hit.exact == 0 && hit.stems == 0 && hit.places == 0 && hit.other_places == 0 && hit.other == 0;
-    hit.repaired = hit.repaired || is_new;
-    hit.other += static_cast<float>(likelihood * Occurrences(found, constants));
+    if (is_new) mark(hit);
+    hit.other += static_cast<float>(share * Occurrences(found, constants));
     const auto places = static_cast<uint8_t>(found.places | found.other_places);
     hit.other_places |= places;
-    if (places != 0) hit.other_share = std::max(hit.other_share, InParts(likelihood));
+    if (places != 0) hit.other_share = std::max(hit.other_share, InParts(share));
   });
-  repaired_.UniteWith(other.collector_.Set());
+  of_others_.UniteWith(other.collector_.Set());
+}
+
+void TermCollector::AddRepaired(const TermCollector& other, double likelihood, const RankingConstants& constants) {
+  AddOther(other, likelihood, constants, [](TermHit& hit) { hit.repaired = true; });
+}
+
+void TermCollector::AddRelated(const TermCollector& other, double share, uint8_t number,
+                               const RankingConstants& constants) {
+  AddOther(other, share, constants, [number](TermHit& hit) { hit.related = number; });
 }
 
 int64_t TermCollector::Documents() const {
   DocSet all = collector_.Set();
-  all.UniteWith(repaired_);
+  all.UniteWith(of_others_);
   return all.Count();
 }
 
 DocSet TermCollector::Set() const {
   DocSet all = collector_.Set();
-  all.UniteWith(repaired_);
+  all.UniteWith(of_others_);
   all.UniteWith(by_name_parts_);
   return all;
 }

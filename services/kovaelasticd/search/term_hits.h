@@ -22,6 +22,7 @@ struct TermHit {
   uint8_t places = 0;        ///< of the word as it is written: a set of HitPlace
   uint8_t other_places = 0;  ///< of the other forms
   uint8_t other_share = 0;   ///< of the best of these, in parts of 255
+  uint8_t related = 0;       ///< n: it has nothing of the word, but of the nth of RankedWord::related
   bool repaired = false;     ///< it has nothing of the word, but of one that this is a misspelling of
 };
 
@@ -54,6 +55,8 @@ class TermCollector {
   void AddNamed(const DocSet& documents);
   /// What another word, of which this one is a misspelling, was found in, by a share of its worth.
   void AddRepaired(const TermCollector& other, double likelihood, const RankingConstants& constants);
+  /// The same of a word that means the same; `number` as in TermHit::related.
+  void AddRelated(const TermCollector& other, double share, uint8_t number, const RankingConstants& constants);
 
   /// Without those by parts of names.
   int64_t Documents() const;
@@ -67,13 +70,15 @@ class TermCollector {
  private:
   template <typename Hit, typename Apply>
   void Merge(const std::vector<Hit>& found, Apply&& apply);
+  template <typename Mark>
+  void AddOther(const TermCollector& other, double share, const RankingConstants& constants, Mark&& mark);
 
   Database& database_;
   HitCollector collector_;
   const Visible& visible_;
   const size_t hits_max_;
   DocSet by_name_parts_;
-  DocSet repaired_;
+  DocSet of_others_;  ///< of other words
   std::vector<TermHit> hits_;
 };
 

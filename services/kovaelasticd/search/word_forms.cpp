@@ -102,6 +102,11 @@ WordForm FormOfAny(const std::vector<std::string>& words) {
   return TextForm(WordForm::Kind::kExact, "(" + any + ")", false, 1);
 }
 
+std::vector<WordForm> FormsOf(const std::vector<std::string>& words, const RankingConstants& constants) {
+  if (words.size() == 1) return FormsOf(words.front(), constants);
+  return {TextForm(WordForm::Kind::kExact, PhraseExpression(words, false), false, 1)};
+}
+
 std::vector<std::string> PhrasesOf(const std::vector<WordForm>& forms) {
   std::vector<std::string> phrases;
   for (const WordForm& form : forms) {

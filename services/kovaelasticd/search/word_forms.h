@@ -33,6 +33,9 @@ std::vector<WordForm> FormsOf(const std::string& word, const RankingConstants& c
 /// Any of these words, as they are.
 WordForm FormOfAny(const std::vector<std::string>& words);
 
+/// The forms of a word, or of a phrase, whose words are looked for as they are.
+std::vector<WordForm> FormsOf(const std::vector<std::string>& words, const RankingConstants& constants);
+
 /// The expressions that find these forms in texts, but for beginnings of words.
 std::vector<std::string> PhrasesOf(const std::vector<WordForm>& forms);
 

@@ -31,7 +31,10 @@ double WordValue::Of(const RankedWord& word, const TermHit& hit, const DocumentS
 
 void WordValue::Explain(const RankedWord& word, const TermHit& hit, const DocumentShape& shape,
                         std::vector<ScorePart>& parts) const {
-  const std::string& what = hit.repaired && !word.repairs.empty() ? word.repairs.front() : word.word;
+  const bool is_related = hit.related > 0 && hit.related <= word.related.size();
+  const std::string& what = is_related                              ? word.related[hit.related - 1U]
+                            : hit.repaired && !word.repairs.empty() ? word.repairs.front()
+                                                                    : word.word;
   double left = Of(word, hit, shape);
   const auto add = [&](const char* where, double value) {
     value = std::min(value, left);

@@ -12,6 +12,7 @@
 #include <json/value.h>
 
 #include "services/kovaelasticd/query/query.h"
+#include "services/kovaelasticd/query/synonyms.h"
 #include "services/kovaelasticd/store/asker.h"
 
 namespace ferrox::engine {
@@ -76,7 +77,8 @@ struct SearchRequest {
   size_t ranked_max = 200000;  ///< so many documents, the newest added, are ranked at most for one word
   std::string mark_start = "[";
   std::string mark_end = "]";
-  const Asker* asker = nullptr;  ///< lives as long as the search; null: whoever asks may read everything
+  const Synonyms* synonyms = nullptr;  ///< lives as long as the search; null: none
+  const Asker* asker = nullptr;        ///< lives as long as the search; null: whoever asks may read everything
   /// Unless "": no query, but the beginning of a word. The reply has completions of it alone, `limit` at most.
   std::string completed = {};
 };
@@ -122,6 +124,7 @@ struct SearchReply {
   std::optional<int64_t> total_all;      ///< of these, those with all words; nothing where all have them anyway
   std::vector<std::string> ignored;      ///< words in so many documents that they find none by themselves
   std::vector<RepairedWord> repaired;    ///< in the order of the query
+  std::vector<RepairedWord> synonyms;    ///< words that were looked for as others, too, which documents have
   bool none_has_all = false;             ///< all_words was asked for, no document has all, and some words sufficed
   bool ranking_bounded = false;          ///< there were more than ranked_max to order; some were left out of that
   std::vector<SearchHit> hits;           ///< from the first, offset + limit of them at most
