@@ -25,6 +25,10 @@ from leak_requests import requests
 ASKER = User(50001, [60001, 60002])
 OWN = [f"{a}{b}" for a in ("ba", "ko", "lu", "me", "ri", "sta", "tor", "vi") for b in ("ran", "dex", "nolt", "pim", "sur", "gel")]
 THEIRS = [f"{a}{b}" for a in ("qua", "xen", "zor", "wyn") for b in ("bral", "timo", "keth", "uria")]
+GERMAN = "Das ist ein Brief an den Vermieter, in dem von {} und {} die Rede ist, und den wir noch nicht beantwortet haben."
+# Some are made of words of other files of the user's, some of words that only files have which the user may not read.
+COMPOUNDS = (("Kündigungsfrist", "Mietvertrag"), ("Kündigung", "Kautionskonto"), ("Fristverlängerung", "Vertragskonto"))
+SYNONYMS = f"{OWN[1]}, {THEIRS[0]}, {OWN[7]}\n{THEIRS[1]} => {OWN[2]}, {THEIRS[2]}\n{OWN[3]} => {OWN[4]} {OWN[5]}\n"
 INODE_TIMES = re.compile(rb'"KOVAMD(AttributeChangeDate|FSCreationDate)":\d+')
 DAY = 86400
 
@@ -39,6 +43,8 @@ def make_own(share, part, files):
     rng = random.Random(part)
     write(f"{share}/{OWN[0]}/known.txt", "known " + " ".join(OWN))
     os.utime(f"{share}/{OWN[0]}/known.txt", (0, 1_400_000_000))
+    write(f"{share}/{OWN[0]}/Brief{part}.txt", GERMAN.format(*COMPOUNDS[part]))
+    os.utime(f"{share}/{OWN[0]}/Brief{part}.txt", (0, 1_400_000_000))
     for number in range(part, files, 3):
         stem = f"{share}/{OWN[number % 11]}/{OWN[number % 5]}/{OWN[rng.randrange(len(OWN))]}{number}"
         body = text(rng, OWN, rng.choice((0, 8, 8, 40, 400)))
@@ -59,7 +65,7 @@ def make_own(share, part, files):
 def make_secrets(share, part, secrets, rng):
     """Files that are shut, in folders of their own that can be read, only entered, or not even that, and among the user's."""
     for number in range(part, secrets, 3):
-        words = rng.choice((OWN, THEIRS, OWN + THEIRS))
+        words = rng.choice((OWN, THEIRS + ["frist", "vertrag", "Mietvertrag"], OWN + THEIRS + ["konto", "Kautionsfrist"]))
         kind = number % 8
         folder = (f"secret{number % 3}/{number % 17}", f"dark/{rng.choice(OWN)}", f"{OWN[number % 11]}/{OWN[number % 5]}")[
             0 if kind < 4 else 1 if kind < 7 or number > 200 else 2]
@@ -93,6 +99,7 @@ def answers(root, files, secrets, asked):
     os.makedirs(root)
     instance = SharedInstance(root)
     try:
+        write(f"{root}/etc/kova/synonyms.conf", SYNONYMS)
         share = instance.share("docs")
         instance.share("other")
         if secrets:

@@ -7,12 +7,14 @@ CONDITIONS = ("ext:txt", "ext:txt,md", "-ext:txt", "kind:folder", "kind:document
               "date:7d", "owner:0", "owner:50001", "owner:50002", "group:60002", "group:0", "type:text/html",
               "from:ada", "to:bob", "subject:{a}", "title:{a}", "title:{b}", "name:{a}", "name:s", "content:{a}",
               "path:\"{share}\"", "path:\"{share}/{a}\"", "path:\"{share}/secret0\"", "path:\"{share}/secret1\"",
-              "path:\"{share}/dark\"", "path:\"{share}/nothing\"", "path:/", "path:\"{share}/past\"", "-absentword",
+              "path:\"{share}/dark\"", "path:\"{share}/nothing\"", "path:/", "path:/docs/{a}", "path:/docs/secret0", "path:/hidden",
+              "path:\"{share}/past\"", "-absentword",
               "KOVAMDSubject:{a}", "KOVAMDTitle:\"{a} {b}\"", "year:1990..2020", "pages:>1", "width:>=1")
 WORDS = ("{a}", "{a} {b}", "{a} {b} {c}", "\"{a} {b}\"", "{a}*", "{p}*", "\"{a} {p}\"*", "{a} OR {b}", "{a} -{b}",
          "({a} OR {b}) -{c}", "NOT {a}", "{t}", "{t} OR {a}", "-{t}", "{a} -{t}", "{t}*", "{tp}*", "\"{t} {a}\"", "{m}",
          "{m} {a}", "{a} ext:txt", "{a} size:>50", "{a} path:\"{share}/{b}\"", "{a} owner:50001", "{a}{b}", "{a}.{b}",
-         "onceopen", "nowhereword", "once", "past", "{w}", "{v}", "name:{v} {a}", "*{t}*", "-{v}", "*")
+         "onceopen", "nowhereword", "once", "past", "{w}", "{v}", "name:{v} {a}", "*{t}*", "-{v}", "*",
+         "Kündigung", "Frist {a}", "Mietvertrag", "Vertrag", "Kaution {t}")
 REFUSED = ("(", "\"{a}", "a*", "OR", "size:many", "date:2018-13", "name:", "{a} OR", "((((((((((((((((({a})", "kind:",
            "x" * 5000, " ".join(["{a}"] * 80))
 PATHS = ("{share}/secret0/0", "{share}/dark", "{share}/secret1", "{share}/nothing", "{share}", "{share}/..", "/etc/passwd",
@@ -44,6 +46,9 @@ def requests(share, own, theirs):
             for query in ("size:>=0", "{p}*", "{a} OR {t}", "kind:folder", "-{t}"):
                 for offset, limit in ((0, 20), (20, 20), (117, 50), (0, 1000), (99999, 1), (5, 0)):
                     search(query, sort=sort, order=order, offset=offset, limit=limit)
+    for query in ("{a} {b} {t}", "{a} {t}", "{t} {tp}x", "{m} {b}", "+{a} {t}", "Frist Miete", "{a} {b} -{c}"):
+        for data in ({"all_words": True}, {"explain": True, "limit": 100}, {"all_words": True, "sort": "date", "explain": True}):
+            search(query, **data)
     for query in REFUSED:
         search(query)
     for shares in (["hidden"], ["none"], ["docs", "hidden"], ["docs", "other"], ["other"], [], "docs", [""], ["docs", "none"]):
