@@ -294,6 +294,48 @@ TEST_F(EngineTest, LostChangesFailTheNextCommit) {
   EXPECT_EQ(Commit("a"), 0) << "said once";
 }
 
+TEST_F(EngineTest, IndicesWithoutAllWordsAddNothingWhereOthersHaveThem) {
+  for (const std::string id : {"a", "b"}) {
+    ASSERT_EQ(Create(id, id), 0);
+    for (int i = 0; i < 12; ++i) ASSERT_EQ(Put(id, "/v/" + id + "/" + std::to_string(i), "filler"), 0);
+    ASSERT_EQ(Put(id, "/v/" + id + "/some", "lantern"), 0);
+  }
+  ASSERT_EQ(Put("a", "/v/a/all", "lantern harbour"), 0);
+  ASSERT_EQ(Commit("a") + Commit("b"), 0);
+  const auto search = [this](const std::string& members) {
+    return Send("search", R"({"query":"lantern harbour filler",)" + members + "}")["data"];
+  };
+  const Json::Value some = search(R"("ids":["a","b"])");
+  EXPECT_EQ(some["total"], 3);
+  EXPECT_EQ(some["total_all"], 0);
+  EXPECT_EQ(some["ignored"][0], "filler");
+  EXPECT_EQ(some["hits"][0]["doc_id"], "/v/a/all");
+  EXPECT_EQ(search(R"("ids":["a","b"],"all_words":true)")["none_has_all"], true);
+  ASSERT_EQ(Put("a", "/v/a/all", "lantern harbour filler"), 0);
+  ASSERT_EQ(Commit("a"), 0);
+  EXPECT_EQ(search(R"("ids":["a","b"])")["total_all"], 1);
+  for (const char* members : {R"("ids":["a","b"],"all_words":true)", R"("ids":["b","a"],"sort":"name")"}) {
+    const Json::Value all = search(members);
+    EXPECT_EQ(all["total"], 1) << members;
+    EXPECT_FALSE(all.isMember("none_has_all") || all.isMember("total_all")) << members;
+  }
+  EXPECT_EQ(search(R"("ids":["b"],"all_words":true)")["none_has_all"], true);
+}
+
+TEST_F(EngineTest, AWordThatAnotherIndexHoldsIsNotRepaired) {
+  ASSERT_EQ(Create("a", "a") + Create("b", "b"), 0);
+  for (int i = 0; i < 30; ++i) ASSERT_EQ(Put("a", "/v/a/" + std::to_string(i), "the licence"), 0);
+  for (int i = 0; i < 3; ++i) ASSERT_EQ(Put("b", "/v/b/" + std::to_string(i), i == 0 ? "the lisence" : "nothing"), 0);
+  ASSERT_EQ(Commit("a") + Commit("b"), 0);
+  const auto search = [this] { return Send("search", R"({"query":"lisence","ids":["a","b"]})")["data"]; };
+  EXPECT_EQ(toString(search()["repaired"]), R"([{"also":true,"from":"lisence","to":"licence"}])");
+  EXPECT_EQ(search()["hits"][0]["doc_id"], "/v/b/0") << "what has the word as it was typed comes first";
+  for (int i = 1; i < 3; ++i) ASSERT_EQ(Put("b", "/v/b/" + std::to_string(i), "the lisence"), 0);
+  ASSERT_EQ(Commit("b"), 0);
+  EXPECT_EQ(search()["total"], 3);
+  EXPECT_FALSE(search().isMember("repaired"));
+}
+
 TEST_F(EngineTest, SynonymsAreToldWhereTheyWereNeededAndWhenAsked) {
   const auto synonyms = std::make_shared<const Synonyms>(std::vector<Synonyms::Rule>{{{"car"}, {"automobile"}}});
   engine_.reset();

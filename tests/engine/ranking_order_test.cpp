@@ -25,6 +25,8 @@ const std::string kRest =
     " was seen by the people who live in the old house on the hill, which they had built after the great war, and so"
     " it was written down in the books that are kept there";
 
+const std::string kGerman = "Das haben wir in dem alten Haus am Berg gefunden, und dann wurde es aufgeschrieben: ";
+
 const Ranked kRules[] = {
     {"the word as it is written comes before its other forms",
      "licences",
@@ -95,6 +97,16 @@ const Ranked kRules[] = {
     {"a synonym that nearly all have does not drown the word",
      "rare harbour",
      {{"/v/z", "rare"}, {"/v/a", "harbour"}, {kNotFound, ""}, {"/v/b", "no"}}},
+    {"a compound comes behind the word itself",
+     "Kündigung",
+     {{"/v/z", kGerman + "Die Kündigung\n"}, {"/v/a", kGerman + "Kündigungsfrist und Frist, Kündigungsfrist\n"}}},
+    {"the last part of a compound finds it",
+     "Frist",
+     {{"/v/z", kGerman + "Frist\n"}, {"/v/a", kGerman + "Kündigungsfristen nach Kündigung\n"}}},
+    {"English has no compounds", "cargo", {{"/v/z", "cargo"}, {kNotFound, ""}, {"/v/a", "cargoship, a ship"}}},
+    {"an article is a part of the word in Arabic",
+     "كتاب",
+     {{"/v/z", "كتاب"}, {"/v/y", " كتاب"}, {"/v/x", "  كتاب"}, {"/v/a", "الكتاب"}}},
     {"a code grouped otherwise is found",
      "AB1234/5",
      {{"/v/a", "file AB-1234/5"}, {kNotFound, ""}, {"/v/b", "file AB 1235"}}},

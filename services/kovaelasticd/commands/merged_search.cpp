@@ -2,6 +2,9 @@
 
 #include <algorithm>
 #include <iterator>
+#include <map>
+#include <optional>
+#include <string>
 #include <tuple>
 #include <utility>
 
@@ -52,22 +55,57 @@ struct IndexReply {
   SearchReply reply;
 };
 
-/// Asks each index by itself. Those that fail are marked, and told to `leave_out`.
-std::vector<IndexReply> AskAll(std::vector<AskedIndex>& indices, SearchRequest request,
+/// Asks one index. When it fails it is marked, and told to `leave_out`.
+std::optional<SearchReply> Ask(AskedIndex& asked, SearchRequest request, const LeaveOutFunction& leave_out) {
+  request.asker = asked.asker.has_value() ? &*asked.asker : nullptr;
+  try {
+    return asked.open.index->Search(request);
+  } catch (const Error& error) {
+    asked.failed = true;
+    leave_out(asked, error);
+    return std::nullopt;
+  }
+}
+
+/// Asks each index by itself.
+std::vector<IndexReply> AskAll(std::vector<AskedIndex>& indices, const SearchRequest& request,
                                const LeaveOutFunction& leave_out) {
   std::vector<IndexReply> replies;
   for (size_t i = 0; i < indices.size(); ++i) {
-    AskedIndex& asked = indices[i];
-    if (asked.failed) continue;
-    request.asker = asked.asker.has_value() ? &*asked.asker : nullptr;
-    try {
-      replies.push_back({i, asked.open.index->Search(request)});
-    } catch (const Error& error) {
-      asked.failed = true;
-      leave_out(asked, error);
-    }
+    if (indices[i].failed) continue;
+    if (auto reply = Ask(indices[i], request, leave_out); reply.has_value()) replies.push_back({i, std::move(*reply)});
   }
   return replies;
+}
+
+/// In how many documents of the other indices the words stand that this one has repaired.
+std::map<std::string, int64_t> HeldElsewhere(const std::vector<IndexReply>& replies, const IndexReply& repaired) {
+  std::map<std::string, int64_t> held;
+  for (const RepairedWord& word : repaired.reply.repaired) {
+    int64_t documents = 0;
+    for (const IndexReply& other : replies) {
+      const auto own = other.reply.documents.find(word.from);
+      if (&other != &repaired && own != other.reply.documents.end()) documents += own->second;
+    }
+    if (documents > 0) held[word.from] = documents;
+  }
+  return held;
+}
+
+/// An index knows its own words alone: where it has repaired one that others hold, it is asked again, and told so. What
+/// others hold is counted for the same asker.
+void AskAgainForHeldWords(std::vector<AskedIndex>& indices, const SearchRequest& request,
+                          std::vector<IndexReply>& replies, const LeaveOutFunction& leave_out) {
+  std::vector<std::optional<SearchReply>> again(replies.size());
+  for (size_t i = 0; i < replies.size(); ++i) {
+    SearchRequest told = request;
+    told.elsewhere = HeldElsewhere(replies, replies[i]);
+    if (told.elsewhere.empty()) continue;
+    again[i] = Ask(indices[replies[i].index], std::move(told), leave_out).value_or(SearchReply());
+  }
+  for (size_t i = 0; i < replies.size(); ++i) {
+    if (again[i].has_value()) replies[i].reply = std::move(*again[i]);
+  }
 }
 
 /// Where one index has documents with all words, the others, asked for the same, have none.
@@ -139,6 +177,7 @@ MergedReply SearchIndices(std::vector<AskedIndex>& indices, const SearchRequest&
     each.limit = request.offset + request.limit;
   }
   std::vector<IndexReply> replies = AskAll(indices, each, leave_out);
+  if (merges) AskAgainForHeldWords(indices, each, replies, leave_out);
   DropPoorSubstitutes(replies);
   MergedReply merged = AddUp(replies);
   if (!request.explain) std::erase_if(merged.synonyms, [](const RepairedWord& word) { return word.also; });

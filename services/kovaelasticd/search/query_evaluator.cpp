@@ -82,6 +82,7 @@ FoundDocuments QueryEvaluator::FindSoftly(const QueryNode& query, const std::vec
   }
   found.repaired = soft_.Repaired();
   found.synonyms = soft_.UsedSynonyms();
+  found.word_documents = soft_.WordDocuments();
   for (RankedWord& word : soft_.TakeRanked()) {
     for (const std::string& other : word.repairs) found_words_.marked.push_back({other, false});
     for (const std::string& other : word.related) {

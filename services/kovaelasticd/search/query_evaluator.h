@@ -2,6 +2,7 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <map>
 #include <optional>
 #include <string>
 #include <vector>
@@ -21,9 +22,10 @@ namespace ferrox::engine {
 struct FoundDocuments {
   DocSet documents;
   std::optional<DocSet> with_all;    ///< of these, those with all words; nothing where all have them
-  std::vector<std::string> ignored;  ///< as in SearchReply, like the next three
+  std::vector<std::string> ignored;  ///< as in SearchReply, like the next four
   std::vector<RepairedWord> repaired;
   std::vector<RepairedWord> synonyms;
+  std::map<std::string, int64_t> word_documents;
   bool none_has_all = false;
 };
 
@@ -32,15 +34,15 @@ struct FoundDocuments {
 class QueryEvaluator {
  public:
   /// `hits_max`: of how many documents each word's hits are kept for ranking (HitCollector); the sets are complete in
-  /// any case. Nothing that is not `visible` is found, or counts. All must outlive this; `synonyms` may be null.
+  /// any case. Nothing that is not `visible` is found, or counts. All must outlive this.
   QueryEvaluator(StoreReader& reader, const Visible& visible, size_t hits_max, const RankingConstants& constants,
-                 const Synonyms* synonyms)
+                 const SearchRequest& request)
       : reader_(reader),
         database_(reader.database),
         visible_(visible),
         hits_max_(hits_max),
         constants_(constants),
-        soft_(reader, visible, hits_max, constants, synonyms) {}
+        soft_(reader, visible, hits_max, constants, request) {}
 
   /// `all_words`: documents must have all words, unless there is none that does. To be called once.
   /// @throws Error kEngineStorage.

@@ -17,6 +17,7 @@ struct RankedWord {
   std::string word;                       ///< folded, as it is shown
   std::vector<std::string> repairs = {};  ///< what hits that are `repaired` have in its place, the likeliest first
   std::vector<std::string> related = {};  ///< what hits may have in its place that is no repair (TermHit::related)
+  size_t synonyms = 0;                    ///< of `related`, the first ones; the others are compounds
   double rarity = 0;                      ///< of all forms together
   size_t letters = 0;                     ///< of `word` (CountLetters): how much it is of a name
   std::vector<TermHit> hits = {};

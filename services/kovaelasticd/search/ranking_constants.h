@@ -26,6 +26,8 @@ struct RankingConstants {
   double stem = 0.6;
   double spelling = 0.9;
   double synonym = 0.8;
+  double compound = 0.3;       ///< that the word is a part of; it is worth
+  double compound_most = 0.5;  ///< at most so much, so that the word itself comes first
 
   // A word that a repair goes beside (SearchReply::repaired with `also`): what the word as it was typed adds at least,
   // and what a repaired one adds at most. So the former come first.

@@ -7,7 +7,6 @@
 
 #include "services/kovaelasticd/search/folder_words.h"
 #include "services/kovaelasticd/search/repair.h"
-#include "services/kovaelasticd/search/synonym_words.h"
 #include "services/kovaelasticd/store/work_limit.h"
 #include "services/kovaelasticd/text/words.h"
 
@@ -17,16 +16,8 @@ namespace {
 
 /// A word in no more documents than that may be a misspelling.
 constexpr int64_t kRepairedDocumentsMax = 2;
-/// So many documents may have another word that a word finds, too, however few there are in all.
-constexpr int64_t kNeverCommon = 50;
 /// Of a common word, so many documents are asked for one by one; for more, walking through all that have it costs less.
 constexpr int64_t kAskOneByOneMax = 100;
-
-/// The word of a condition that is one; "" for what is several, or the beginning of one.
-std::string SingleWord(const QueryNode& node) {
-  QueryWords words = SplitQueryText(node.text, node.prefix);
-  return words.words.size() == 1 && !words.prefix && !node.phrase ? std::move(words.words.front()) : std::string();
-}
 
 }  // namespace
 
@@ -102,6 +93,7 @@ void SoftWords::Find(const std::vector<const QueryNode*>& nodes, bool rare_besid
     word.is_common = !word.is_ignored && IsCommon(word.found->Documents());
   }
   FindSynonyms(nodes);
+  FindCompounds();
   LookForRepairs();
   const auto is_rare = [](const Word& word) {
     return !word.is_ignored && !word.is_common && word.found->Documents() > 0;
@@ -124,49 +116,27 @@ void SoftWords::FindSpellings(Word& word) const {
   const std::string single = SingleWord(*word.node);
   const bool has_pair =
       single.find("ae") != single.npos || single.find("oe") != single.npos || single.find("ue") != single.npos;
-  if (!has_pair && word.found->Documents() > kRepairedDocumentsMax) return;
+  // Articles are written as a part of the word: UTF-8 of Hebrew begins with D7, of Arabic with D8 to DB.
+  const bool has_article = !single.empty() && single[0] >= '\xD7' && single[0] <= '\xDB';
+  if (!has_pair && !has_article && word.found->Documents() > kRepairedDocumentsMax) return;
   const std::vector<WordForm> spellings = SpellingForms(single, constants_);
   word.found->Collect(spellings);
   word.forms.insert(word.forms.end(), spellings.begin(), spellings.end());
-}
-
-void SoftWords::FindSynonyms(const std::vector<const QueryNode*>& nodes) {
-  if (synonyms_ == nullptr || synonyms_->IsEmpty()) return;
-  std::vector<std::string> singles;
-  for (const QueryNode* node : nodes) singles.push_back(SingleWord(*node));
-  const std::vector<SynonymOfWord> synonyms = SynonymsIn(singles, *synonyms_);
-  for (Word& word : words_) {
-    if (word.is_ignored) continue;
-    const bool has_own = word.found->Documents() > 0;
-    for (const SynonymOfWord& synonym : synonyms) {
-      if (singles[synonym.of] != SingleWord(*word.node)) continue;
-      if (!TakeRelated(word, synonym.shown, FormsOf(synonym.words, constants_), constants_.synonym)) continue;
-      used_synonyms_.push_back({synonym.from, synonym.shown, has_own});
-    }
-  }
-}
-
-/// Adds what is found of another word by a share of its worth. False where that is nothing, or so much that the word
-/// would not be rare any more.
-bool SoftWords::TakeRelated(Word& word, const std::string& shown, const std::vector<WordForm>& forms, double share) {
-  WorkLimit::Check();
-  TermCollector found(reader_.database, visible_, hits_max_);
-  found.StopAfter(word.is_common ? WalkedMax() : std::max(kNeverCommon, CommonMax()));
-  found.Collect(forms);
-  if (found.HasStopped() || found.Documents() == 0) return false;
-  word.related.push_back(shown);
-  word.found->AddRelated(found, share, static_cast<uint8_t>(word.related.size()), constants_);
-  word.forms.insert(word.forms.end(), forms.begin(), forms.end());
-  return true;
 }
 
 void SoftWords::LookForRepairs() {
   std::vector<RareWord> rare;
   std::vector<size_t> places;
   for (size_t i = 0; i < words_.size(); ++i) {
-    const int64_t documents = words_[i].is_ignored ? kRepairedDocumentsMax + 1 : words_[i].found->Documents();
-    std::string single = SingleWord(*words_[i].node);
-    if (documents > kRepairedDocumentsMax || single.empty()) continue;
+    Word& word = words_[i];
+    std::string single = SingleWord(*word.node);
+    if (single.empty()) continue;
+    const auto elsewhere = request_.elsewhere.find(word.text);
+    word.elsewhere = elsewhere == request_.elsewhere.end() ? 0 : elsewhere->second;
+    const int64_t own = word.is_ignored ? kRepairedDocumentsMax + 1 : word.found->Documents();
+    word_documents_[word.text] = own;
+    const int64_t documents = own + word.elsewhere;
+    if (documents > kRepairedDocumentsMax) continue;
     rare.push_back({std::move(single), documents});
     places.push_back(i);
   }
@@ -179,7 +149,7 @@ void SoftWords::LookForRepairs() {
 /// Adds what is found of the other word.
 void SoftWords::TakeRepair(Word& word, const std::string& other, double likelihood) {
   WorkLimit::Check();
-  const bool has_own = word.own_first || (word.repairs.empty() && word.found->Documents() > 0);
+  const bool has_own = word.own_first || (word.repairs.empty() && word.found->Documents() + word.elsewhere > 0);
   TermCollector found(reader_.database, visible_, hits_max_);
   const std::vector<WordForm> forms = FormsOf(other, constants_);
   found.Collect(forms);
@@ -271,6 +241,7 @@ std::vector<RankedWord> SoftWords::TakeRanked() {
     taken.own_first = word.own_first;
     taken.repairs = std::move(word.repairs);
     taken.related = std::move(word.related);
+    taken.synonyms = word.synonyms;
     taken.phrases = PhrasesOf(word.forms);
   }
   return ranked;

@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <cstdint>
+#include <map>
 #include <memory>
 #include <string>
 #include <vector>
@@ -14,6 +15,7 @@
 #include "services/kovaelasticd/store/index_store.h"
 #include "services/kovaelasticd/store/store_reader.h"
 #include "services/kovaelasticd/store/visible.h"
+#include "services/kovaelasticd/store/word_list.h"
 
 namespace ferrox::engine {
 
@@ -24,10 +26,10 @@ namespace ferrox::engine {
 /// What is in no visible document, or hardly in any, is looked for as what was probably meant, too (RepairWords).
 class SoftWords {
  public:
-  /// `hits_max` as in HitCollector; `synonyms` may be null. All must outlive this.
+  /// `hits_max` as in HitCollector; all must outlive this.
   SoftWords(StoreReader& reader, const Visible& visible, size_t hits_max, const RankingConstants& constants,
-            const Synonyms* synonyms)
-      : reader_(reader), visible_(visible), hits_max_(hits_max), constants_(constants), synonyms_(synonyms) {}
+            const SearchRequest& request)
+      : reader_(reader), visible_(visible), hits_max_(hits_max), constants_(constants), request_(request) {}
 
   /// Looks for the words; `rare_beside`: a required one that is rare stands beside them.
   /// @throws Error kEngineStorage, as all that follow.
@@ -44,6 +46,8 @@ class SoftWords {
   std::vector<std::string> Ignored() const;
   const std::vector<RepairedWord>& Repaired() const { return repaired_; }
   const std::vector<RepairedWord>& UsedSynonyms() const { return used_synonyms_; }
+  /// SearchReply::documents.
+  const std::map<std::string, int64_t>& WordDocuments() const { return word_documents_; }
   /// Hands the words that score over.
   std::vector<RankedWord> TakeRanked();
 
@@ -57,9 +61,11 @@ class SoftWords {
     DocSet folders = {};
     bool is_ignored = false;
     bool is_common = false;  ///< not ignored, but admits no document
+    int64_t elsewhere = 0;   ///< SearchRequest::elsewhere
     bool own_first = false;  ///< repairs go beside it
     std::vector<std::string> repairs = {};
     std::vector<std::string> related = {};
+    size_t synonyms = 0;  ///< of `related`, the first ones
   };
 
   /// A word to be looked for; `group`: the first of the words that it may be one number or code with, else null.
@@ -75,6 +81,10 @@ class SoftWords {
   int64_t WalkedMax() const { return std::max(CommonMax(), constants_.common_scored_max); }
   std::vector<bool> Rarest(const std::vector<Wanted>& wanted);
   void FindSpellings(Word& word) const;
+  bool MayHaveCompounds();
+  void FindCompounds();
+  void TakeCompounds(Word& word, const WordList& known);
+  bool IsVisible(const std::string& word);
   void FindSynonyms(const std::vector<const QueryNode*>& nodes);
   bool TakeRelated(Word& word, const std::string& shown, const std::vector<WordForm>& forms, double share);
   void LookForRepairs();
@@ -87,10 +97,11 @@ class SoftWords {
   const Visible& visible_;
   const size_t hits_max_;
   const RankingConstants& constants_;
-  const Synonyms* const synonyms_;
+  const SearchRequest& request_;
   std::vector<Word> words_;
   std::vector<RepairedWord> repaired_;
   std::vector<RepairedWord> used_synonyms_;
+  std::map<std::string, int64_t> word_documents_;
 };
 
 }  // namespace ferrox::engine

@@ -67,7 +67,7 @@ SearchReply Searcher::Run() {
     return reply;
   }
   const bool by_relevance = request_.sort == SortKey::kRelevance;
-  QueryEvaluator evaluator(reader_, visible_, by_relevance ? request_.ranked_max : 0, constants_, request_.synonyms);
+  QueryEvaluator evaluator(reader_, visible_, by_relevance ? request_.ranked_max : 0, constants_, request_);
   FoundDocuments found = evaluator.Find(*request_.query, request_.all_words || !by_relevance);
   SearchReply reply;
   reply.total = found.documents.Count();
@@ -75,6 +75,7 @@ SearchReply Searcher::Run() {
   reply.ignored = std::move(found.ignored);
   reply.repaired = std::move(found.repaired);
   reply.synonyms = std::move(found.synonyms);
+  reply.documents = std::move(found.word_documents);
   reply.none_has_all = found.none_has_all;
   reply.hints = evaluator.Words().hints;
   PutPage(found, evaluator.Words(), reply);

@@ -66,6 +66,11 @@ std::vector<WordForm> OtherForms(const std::vector<std::string>& words, const Ra
 
 }  // namespace
 
+std::string SingleWord(const QueryNode& node) {
+  QueryWords words = SplitQueryText(node.text, node.prefix);
+  return words.words.size() == 1 && !words.prefix && !node.phrase ? std::move(words.words.front()) : std::string();
+}
+
 std::vector<WordForm> FormsOf(const QueryNode& node, bool widely, const RankingConstants& constants) {
   const QueryWords words = SplitQueryText(node.text, node.prefix);
   if (node.type == QueryNode::Type::kField) return {FieldForm(node, words)};

@@ -18,6 +18,9 @@ struct WordForm {
   double share = 1;     ///< of what the word itself is worth
 };
 
+/// The word of a condition that is one; "" for what is several, or the beginning of one.
+std::string SingleWord(const QueryNode& node);
+
 /// How a condition of type kText, kField or kName is looked for: as it is written first. `widely`: as stems and in
 /// other spellings too, which is for plain words that documents are ranked by.
 std::vector<WordForm> FormsOf(const QueryNode& node, bool widely, const RankingConstants& constants);

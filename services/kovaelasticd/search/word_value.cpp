@@ -25,6 +25,7 @@ double WordValue::Of(const RankedWord& word, const TermHit& hit, const DocumentS
   double value = Text(hit, shape.length) + Places(hit.places, shape);
   const auto other_places = static_cast<uint8_t>(hit.other_places & ~hit.places);
   if (other_places != 0) value += OtherShare(hit) * Places(other_places, shape);
+  if (hit.related > word.synonyms) value = std::min(value, c_.compound_most);
   if (word.own_first) value = hit.repaired ? std::min(value, c_.repaired_most) : value + c_.own_word;
   return word.rarity * value;
 }

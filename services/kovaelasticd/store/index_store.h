@@ -79,6 +79,9 @@ struct SearchRequest {
   std::string mark_end = "]";
   const Synonyms* synonyms = nullptr;  ///< lives as long as the search; null: none
   const Asker* asker = nullptr;        ///< lives as long as the search; null: whoever asks may read everything
+  /// In how many documents of other indices that are asked as well a word of the query stands: as if it were in so many
+  /// more of this one, it is not repaired, or beside it only. Empty for one index.
+  std::map<std::string, int64_t> elsewhere = {};
   /// Unless "": no query, but the beginning of a word. The reply has completions of it alone, `limit` at most.
   std::string completed = {};
 };
@@ -120,17 +123,18 @@ struct SearchHit {
 };
 
 struct SearchReply {
-  int64_t total = 0;                     ///< all documents found, whether shown or not
-  std::optional<int64_t> total_all;      ///< of these, those with all words; nothing where all have them anyway
-  std::vector<std::string> ignored;      ///< words in so many documents that they find none by themselves
-  std::vector<RepairedWord> repaired;    ///< in the order of the query
-  std::vector<RepairedWord> synonyms;    ///< words that were looked for as others, too, which documents have
-  bool none_has_all = false;             ///< all_words was asked for, no document has all, and some words sufficed
-  bool ranking_bounded = false;          ///< there were more than ranked_max to order; some were left out of that
-  std::vector<SearchHit> hits;           ///< from the first, offset + limit of them at most
-  std::vector<std::string> suggestions;  ///< other spellings, when nothing was found
-  std::vector<Completion> completions;   ///< where it was no search
-  std::vector<std::string> hints = {};   ///< sentences about what was looked for otherwise than it may be meant
+  int64_t total = 0;                         ///< all documents found, whether shown or not
+  std::optional<int64_t> total_all;          ///< of these, those with all words; nothing where all have them anyway
+  std::vector<std::string> ignored;          ///< words in so many documents that they find none by themselves
+  std::vector<RepairedWord> repaired;        ///< in the order of the query
+  std::map<std::string, int64_t> documents;  ///< that have the single plain words, as they are typed, or a synonym
+  std::vector<RepairedWord> synonyms;        ///< words that were looked for as others, too, which documents have
+  bool none_has_all = false;                 ///< all_words was asked for, no document has all, and some words sufficed
+  bool ranking_bounded = false;              ///< there were more than ranked_max to order; some were left out of that
+  std::vector<SearchHit> hits;               ///< from the first, offset + limit of them at most
+  std::vector<std::string> suggestions;      ///< other spellings, when nothing was found
+  std::vector<Completion> completions;       ///< where it was no search
+  std::vector<std::string> hints = {};       ///< sentences about what was looked for otherwise than it may be meant
 };
 
 /// Figures of an index; those of documents are as of its last commit.

@@ -42,6 +42,25 @@ class WordList {
     }
   }
 
+  bool Has(std::string_view word) const {
+    if (word.size() > kMostBytes) return false;
+    const Group& group = groups_[word.size()];
+    const size_t at = group.FirstFrom(word, word.size());
+    return at < group.letters.size() && group.Word(at, word.size()) == word;
+  }
+
+  /// Calls `visit(word)` for each longer word that has all letters of `word`: those that contain it are among them.
+  template <typename Visitor>
+  void ForEachWith(std::string_view word, Visitor&& visit) const {
+    const uint32_t letters = LettersOf(word);
+    for (size_t bytes = word.size() + 1; bytes <= kMostBytes; ++bytes) {
+      const Group& group = groups_[bytes];
+      for (size_t i = 0; i < group.letters.size(); ++i) {
+        if ((letters & ~group.letters[i]) == 0) visit(group.Word(i, bytes));
+      }
+    }
+  }
+
   /// Calls `visit(word, in_several)` for each word that begins with `begin`, those of one size in the order of bytes.
   template <typename Visitor>
   void ForEachBeginning(std::string_view begin, Visitor&& visit) const {
