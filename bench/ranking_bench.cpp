@@ -64,6 +64,7 @@ constexpr Named kNamed[] = {
     {"near_text", &RankingConstants::near_text},
     {"near_title", &RankingConstants::near_title},
     {"near_half", &RankingConstants::near_half},
+    {"function_word", &RankingConstants::function_word},
     {"long_query", &RankingConstants::long_query},
     {"near_backwards", &RankingConstants::near_backwards},
 };

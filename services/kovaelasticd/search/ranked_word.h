@@ -25,6 +25,7 @@ struct RankedWord {
   double folder_rarity = 0;
   bool own_first = false;                 ///< hits that are `repaired` come behind the others
   std::vector<std::string> phrases = {};  ///< full-text expressions, each for a single word, for nearness
+  bool is_function = false;               ///< FindFunctionWords
   int64_t documents = 0;                  ///< how many have it, but for parts of names and for folders
 };
 

@@ -22,6 +22,10 @@ struct RankingConstants {
   double in_name_part = 0.3;  ///< within a word of the name
   double in_folder = 0.5;     ///< the name of a folder above
 
+  /// Of a word that only holds a sentence together (FindFunctionWords), the share that its occurrences in the text
+  /// count. In names and titles such a word is as good as any.
+  double function_word = 0;
+
   // Other forms of a word, as a share of what the word itself is worth.
   double stem = 0.6;
   double spelling = 0.9;
@@ -40,7 +44,8 @@ struct RankingConstants {
   double near_half = 1.0;       ///< so much nearness (1: right behind each other, once) adds half of what it may
   double near_backwards = 0.6;  ///< the share of words in another order than the query's
 
-  // A query of more words than this describes something: the more they are, the less title and nearness count.
+  // A query of more words than this, without function words, describes something: the more they are, the less title and
+  // nearness count.
   double long_query = 4;
 
   // What bounds the work.

@@ -31,9 +31,11 @@ void ForEachCandidateHit(std::vector<Candidate>& candidates, const std::vector<T
   }
 }
 
-/// The constants for a query of so many words.
-RankingConstants ForWords(RankingConstants constants, size_t words) {
-  const double share = std::min(1.0, constants.long_query / std::max(1.0, static_cast<double>(words)));
+/// The constants for a query of these words.
+RankingConstants ForWords(RankingConstants constants, const std::vector<RankedWord>& words) {
+  const auto telling =
+      std::count_if(words.begin(), words.end(), [](const RankedWord& word) { return !word.is_function; });
+  const double share = std::min(1.0, constants.long_query / std::max(1.0, static_cast<double>(telling)));
   for (double* const value : {&constants.in_title, &constants.near_text, &constants.near_title}) *value *= share;
   return constants;
 }
@@ -49,7 +51,7 @@ RelevanceRanking::RelevanceRanking(StoreReader& reader, const Visible& visible, 
       average_text_(std::max(
           1.0, static_cast<double>(visible.TextBytes()) / std::max(1.0, static_cast<double>(visible.WithContent())))),
       ranked_max_(request.ranked_max),
-      constants_(ForWords(constants, words.size())),
+      constants_(ForWords(constants, words)),
       value_(constants_),
       nearness_(reader.database, words, constants_),
       priors_(reader, *request.query) {}

@@ -8,6 +8,7 @@
 #include "services/kovaelasticd/search/folder_words.h"
 #include "services/kovaelasticd/search/repair.h"
 #include "services/kovaelasticd/store/work_limit.h"
+#include "services/kovaelasticd/text/function_words.h"
 #include "services/kovaelasticd/text/words.h"
 
 namespace ferrox::engine {
@@ -24,6 +25,8 @@ constexpr int64_t kAskOneByOneMax = 100;
 SoftWords::Word SoftWords::MakeWord(const Wanted& wanted) const {
   Word word = {wanted.node, wanted.group, FoldText(wanted.node->text), FormsOf(*wanted.node, true, constants_),
                std::make_unique<TermCollector>(reader_.database, visible_, hits_max_)};
+  word.is_function = wanted.is_function;
+  if (word.is_function) word.forms.resize(1);  // its stem tells nothing
   if (wanted.group != nullptr) {
     for (WordForm& form : CodeForms(wanted.group->joined, constants_)) word.forms.push_back(std::move(form));
   }
@@ -78,8 +81,18 @@ std::vector<bool> SoftWords::Rarest(const std::vector<Wanted>& wanted) {
   return counts;
 }
 
+/// A part in quotation marks is none.
+void SoftWords::MarkFunctionWords(std::vector<Wanted>& wanted) {
+  std::vector<std::string> words;
+  words.reserve(wanted.size());
+  for (const Wanted& one : wanted) words.push_back(SingleWord(*one.node));
+  const std::vector<bool> are = FindFunctionWords(words);
+  for (size_t i = 0; i < wanted.size(); ++i) wanted[i].is_function = are[i];
+}
+
 void SoftWords::Find(const std::vector<const QueryNode*>& nodes, bool rare_beside) {
-  const std::vector<Wanted> distinct = Distinct(nodes);
+  std::vector<Wanted> distinct = Distinct(nodes);
+  MarkFunctionWords(distinct);
   const std::vector<bool> counts = Rarest(distinct);
   for (size_t i = 0; i < distinct.size(); ++i) {
     WorkLimit::Check();
@@ -90,7 +103,7 @@ void SoftWords::Find(const std::vector<const QueryNode*>& nodes, bool rare_besid
     word.found->Collect(word.forms);
     if (!word.found->HasStopped()) FindSpellings(word);
     word.is_ignored = word.found->HasStopped();
-    word.is_common = !word.is_ignored && IsCommon(word.found->Documents());
+    word.is_common = !word.is_ignored && (word.is_function || IsCommon(word.found->Documents()));
   }
   FindSynonyms(nodes);
   FindCompounds();
@@ -100,7 +113,7 @@ void SoftWords::Find(const std::vector<const QueryNode*>& nodes, bool rare_besid
   };
   if (!rare_beside && std::none_of(words_.begin(), words_.end(), is_rare)) {
     for (size_t i = 0; i < words_.size(); ++i) {
-      words_[i].is_common = false;
+      words_[i].is_common = words_[i].is_function = distinct[i].is_function = false;
       if (!words_[i].is_ignored || !counts[i]) continue;
       words_[i] = MakeWord(distinct[i]);
       words_[i].found->Collect(words_[i].forms);
@@ -191,7 +204,7 @@ bool SoftWords::Has(int64_t id, const Word& word) {
 
 /// A word that was not walked through to its end.
 void SoftWords::KeepIgnored(DocSet& documents, const Word& word) {
-  Word all = MakeWord({word.node, word.group});
+  Word all = MakeWord({word.node, word.group, word.is_function});
   FindElsewhere(all);
   if (documents.Count() <= kAskOneByOneMax) {
     DocSet found = all.found->Set();
@@ -238,6 +251,7 @@ std::vector<RankedWord> SoftWords::TakeRanked() {
     taken.hits = word.found->TakeHits();
     taken.folder_rarity = std::min(taken.rarity, Rarity(visible_.Documents(), word.folders.Count()));
     taken.folders = std::move(word.folders);
+    taken.is_function = word.is_function;
     taken.own_first = word.own_first;
     taken.repairs = std::move(word.repairs);
     taken.related = std::move(word.related);

@@ -60,20 +60,23 @@ class SoftWords {
     std::unique_ptr<TermCollector> found;
     DocSet folders = {};
     bool is_ignored = false;
-    bool is_common = false;  ///< not ignored, but admits no document
-    int64_t elsewhere = 0;   ///< SearchRequest::elsewhere
-    bool own_first = false;  ///< repairs go beside it
+    bool is_common = false;    ///< not ignored, but admits no document
+    bool is_function = false;  ///< FindFunctionWords; admits none either
+    int64_t elsewhere = 0;     ///< SearchRequest::elsewhere
+    bool own_first = false;    ///< repairs go beside it
     std::vector<std::string> repairs = {};
     std::vector<std::string> related = {};
     size_t synonyms = 0;  ///< of `related`, the first ones
   };
 
-  /// A word to be looked for; `group`: the first of the words that it may be one number or code with, else null.
+  /// A word to be looked for.
   struct Wanted {
     const QueryNode* node;
-    const QueryNode* group;
+    const QueryNode* group;    ///< the first of the words that it may be one number or code with, else null
+    bool is_function = false;  ///< FindFunctionWords
   };
   static std::vector<Wanted> Distinct(const std::vector<const QueryNode*>& nodes);
+  static void MarkFunctionWords(std::vector<Wanted>& wanted);
   Word MakeWord(const Wanted& wanted) const;
   bool IsCommon(int64_t documents) const { return documents > CommonMax(); }
   int64_t CommonMax() const { return visible_.Documents() / constants_.common_part; }

@@ -43,12 +43,17 @@ WordForm FieldForm(const QueryNode& node, const QueryWords& words) {
   return form;
 }
 
-/// The marked stems, and those unmarked, which words that are their own stem have alone: together one form.
+/// The marked stems, and those unmarked, which words that are their own stem have alone: together one form. But where
+/// the word is its own stem, the mark is at other forms of it only: what it finds comes beside the word itself.
 void AddStems(std::vector<WordForm>& forms, const std::string& word, double share) {
   std::string any;
   for (const std::string& stem : QueryStems(word)) {
+    if (stem.substr(1) == word) {
+      forms.push_back(TextForm(WordForm::Kind::kOther, PhraseExpression({stem}, false), false, share));
+      continue;
+    }
     for (const std::string& form : {stem, stem.substr(1)}) {
-      if (form == word || form.empty()) continue;
+      if (form.empty()) continue;
       any += (any.empty() ? "" : " OR ") + PhraseExpression({form}, false);
     }
   }

@@ -16,13 +16,13 @@ double WordValue::Places(uint8_t places, const DocumentShape& shape) const {
 }
 
 /// The term of BM25.
-double WordValue::Text(const TermHit& hit, double length) const {
+double WordValue::Text(const RankedWord& word, const TermHit& hit, double length) const {
   const double count = Occurrences(hit, c_);
-  return count * (c_.k1 + 1) / (count + c_.k1 * length);
+  return (word.is_function ? c_.function_word : 1) * count * (c_.k1 + 1) / (count + c_.k1 * length);
 }
 
 double WordValue::Of(const RankedWord& word, const TermHit& hit, const DocumentShape& shape) const {
-  double value = Text(hit, shape.length) + Places(hit.places, shape);
+  double value = Text(word, hit, shape.length) + Places(hit.places, shape);
   const auto other_places = static_cast<uint8_t>(hit.other_places & ~hit.places);
   if (other_places != 0) value += OtherShare(hit) * Places(other_places, shape);
   if (hit.related > word.synonyms) value = std::min(value, c_.compound_most);
@@ -49,7 +49,7 @@ void WordValue::Explain(const RankedWord& word, const TermHit& hit, const Docume
   add("title", place(kInTitle));
   add("name", place(kInName | kInNamePart));
   add("fields", place(kInText));
-  add("text", word.rarity * Text(hit, shape.length));
+  add("text", word.rarity * Text(word, hit, shape.length));
   add("as typed", left);
 }
 

@@ -34,7 +34,7 @@ class WordValue {
 
  private:
   double Places(uint8_t places, const DocumentShape& shape) const;
-  double Text(const TermHit& hit, double length) const;
+  double Text(const RankedWord& word, const TermHit& hit, double length) const;
 
   const RankingConstants& c_;
 };
