@@ -18,7 +18,7 @@ USAGES = (
     (2, "Did you mean: unread?", "unred"),
     (2, "Did you mean: folder add?", "foldr add /photo"),
     (2, "Did you mean: folder add or share add?", "add /photo"),
-    (2, "Did you mean: folder list or share list?", "list"),
+    (2, "Did you mean: folder list or share list or token list?", "list"),
     (2, "Try 'fileindexctl help'", "xyzzy"),
     (2, "one of: add, set, delete, reindex, get, list", "folder"),
     (2, 'no command "folder ad". Did you mean: folder add?', "folder ad /photo"),

@@ -3,6 +3,8 @@
 #include <algorithm>
 #include <array>
 #include <string>
+#include <tuple>
+#include <utility>
 
 namespace ferrox::engine {
 
@@ -13,11 +15,35 @@ constexpr size_t kTermsMax = 16;
 /// Words further apart add nothing.
 constexpr uint32_t kFarthest = 16;
 
-/// By document, position and word, in one number, which sorts faster. No text has 2^27 words.
-uint64_t PlaceOf(const WordPosition& word) {
-  static_assert(kTermsMax <= 32);
-  return uint64_t{word.document} << 32 | (word.position & 0x07FFFFFF) << 5 | word.term;
-}
+/// Positions as CollectPositions finds them: in runs in the order of documents. Hands out those of one document.
+class PositionRuns {
+ public:
+  explicit PositionRuns(const std::vector<WordPosition>& positions) {
+    const WordPosition* const last = positions.data() + positions.size();
+    for (const WordPosition* begin = positions.data(); begin != last;) {
+      const WordPosition* end = std::is_sorted_until(
+          begin, last, [](const WordPosition& a, const WordPosition& b) { return a.document < b.document; });
+      runs_.push_back({begin, end});
+      begin = end;
+    }
+  }
+
+  /// In the order of the text; to be asked for in ascending order of documents, each that has positions.
+  const std::vector<WordPosition>& Of(int64_t document) {
+    found_.clear();
+    for (auto& [at, end] : runs_) {
+      while (at != end && at->document == document) found_.push_back(*at++);
+    }
+    std::sort(found_.begin(), found_.end(), [](const WordPosition& a, const WordPosition& b) {
+      return std::tie(a.position, a.term) < std::tie(b.position, b.term);
+    });
+    return found_;
+  }
+
+ private:
+  std::vector<std::pair<const WordPosition*, const WordPosition*>> runs_;
+  std::vector<WordPosition> found_;
+};
 
 }  // namespace
 
@@ -58,15 +84,10 @@ void Nearness::Add(const char* table, const char* column, double worth, const st
     CollectPositions(database_, table, expression,
                      {wanted, constants_.near_positions_max, static_cast<uint8_t>(term), positions});
   }
-  std::sort(positions.begin(), positions.end(),
-            [](const WordPosition& a, const WordPosition& b) { return PlaceOf(a) < PlaceOf(b); });
-  size_t place = 0;
-  for (size_t begin = 0; begin < positions.size();) {
-    size_t end = begin;
-    while (end < positions.size() && positions[end].document == positions[begin].document) ++end;
-    while (documents[place] < positions[begin].document) ++place;
-    values[place] += Value(positions.data() + begin, positions.data() + end, worth);
-    begin = end;
+  PositionRuns runs(positions);
+  for (size_t i = 0; i < documents.size(); ++i) {
+    const std::vector<WordPosition>& found = runs.Of(documents[i]);
+    if (found.size() > 1) values[i] += Value(found.data(), found.data() + found.size(), worth);
   }
 }
 
@@ -75,7 +96,7 @@ void Nearness::Add(const char* table, const char* column, double worth, const st
 double Nearness::Value(const WordPosition* begin, const WordPosition* end, double worth) const {
   std::array<float, kTermsMax * kTermsMax> near{};
   bool any = false;
-  for (const WordPosition* at = begin; at + 1 < end; ++at) {
+  for (const WordPosition* at = begin; end - at > 1; ++at) {
     const uint32_t apart = std::max<uint32_t>(1, at[1].position - at->position);
     if (at->term == at[1].term || apart > kFarthest) continue;
     const bool in_order = at->term < at[1].term;
