@@ -46,7 +46,7 @@ struct RankingConstants {
 
   // A query of more words than this, without function words, describes something: the more they are, the less title and
   // nearness count.
-  double long_query = 4;
+  double long_query = 2.5;
 
   // What bounds the work.
   size_t words_max = 32;               ///< of a query's words the rarest count
@@ -54,7 +54,7 @@ struct RankingConstants {
   int64_t common_scored_max = 200000;  ///< and does not even score when it is in more than so many
   size_t near_words_max = 8;           ///< the rarest are looked at for nearness
   int64_t near_documents_max = 12000;  ///< a word in more documents is not
-  size_t near_positions_max = 32;      ///< of a word in a document
+  size_t near_positions_max = 16;      ///< of a word in a document
 };
 
 }  // namespace ferrox::engine
