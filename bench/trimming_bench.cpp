@@ -19,8 +19,8 @@
 
 #include <json/value.h>
 
-#include "services/kovaelasticd/query/query.h"
 #include "base/name_rules.h"
+#include "services/kovaelasticd/query/query.h"
 #include "services/kovaelasticd/store/sqlite_store.h"
 
 namespace {
