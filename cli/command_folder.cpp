@@ -13,6 +13,7 @@
 #include "cli/command_table.h"
 #include "cli/configuration_change.h"
 #include "cli/escape.h"
+#include "cli/excluded.h"
 #include "cli/explain.h"
 #include "cli/folder_exclusions.h"
 #include "cli/folder_path.h"
@@ -97,12 +98,13 @@ int PreviewFolders(const Arguments& arguments, const Kinds& kinds) {
   for (const std::string& path : paths) {
     if (!fileindex::CanPathBeIndexed(path)) throw Failure(path + " cannot be indexed: " + WhyNotIndexable(path));
     const std::string full_path = fileindex::GetFullPath(path);
-    std::map<std::string, std::string> others;
+    const std::string share = fileindex::GetShareNameByPath(path);
+    PreviewRequest request = {path, sdk::SDKShare(share).GetPath(), full_path, kinds, RulesOf(share), {}};
+    request.rules.folders[full_path] = PatternsAfter(arguments, path);
     for (const auto& folder : configured.GetFolders()) {
-      if (base::IsBelow(folder->GetPath(), path)) others[folder->GetFullPath()] = "it is indexed already";
+      if (base::IsBelow(folder->GetPath(), path)) request.others[folder->GetFullPath()] = "it is indexed already";
     }
-    ShowPreview(path, sdk::SDKShare(fileindex::GetShareNameByPath(path)).GetPath(), full_path, kinds, std::move(others),
-                arguments.Has("--json"));
+    ShowPreview(std::move(request), arguments.Has("--json"));
     if (configured.IsFullPathIndexed(full_path)) {
       (void)fprintf(stderr, "%s lies in a folder that is indexed already: at most its kinds would change\n",
                     EscapeForTerminal(path).c_str());

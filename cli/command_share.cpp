@@ -9,6 +9,7 @@
 #include "cli/command_table.h"
 #include "cli/configuration_change.h"
 #include "cli/escape.h"
+#include "cli/excluded.h"
 #include "cli/explain.h"
 #include "cli/output.h"
 #include "cli/own_share.h"
@@ -148,7 +149,9 @@ int PreviewShare(const Arguments& arguments, const kova::host::ShareEntry& entry
     (void)fprintf(stderr, "there is a share %s already: %s\n", EscapeForTerminal(entry.name).c_str(),
                   EscapeForTerminal(path).c_str());
   }
-  ShowPreview(entry.path, entry.path, entry.path, Kinds(std::string("all")), {}, arguments.Has("--json"));
+  PreviewRequest request = {entry.path, entry.path, entry.path, Kinds(std::string("all")), RulesOf(entry.name), {}};
+  request.rules.folders[entry.path];
+  ShowPreview(std::move(request), arguments.Has("--json"));
   if (!arguments.Has("--json")) (void)printf("nothing was changed\n");
   return kDone;
 }

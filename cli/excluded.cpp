@@ -19,8 +19,7 @@ std::vector<std::pair<std::string, base::PatternLists>> PatternsForAll() {
   return patterns;
 }
 
-services::ExclusionReason WhyExcluded(const std::string& share, const std::string& full_path) {
-  const std::string root = sdk::SDKShare(share).GetPath();
+services::ExclusionRules RulesOf(const std::string& share) {
   services::ExclusionRules rules;
   rules.instance = PatternsForAll();
   const services::FolderPatterns patterns = services::LoadFolderPatterns();
@@ -30,9 +29,13 @@ services::ExclusionReason WhyExcluded(const std::string& share, const std::strin
     const auto own = patterns.find(folder->GetPath());
     rules.folders[folder->GetFullPath()] = own == patterns.end() ? base::PatternLists() : own->second;
   }
+  return rules;
+}
+
+services::ExclusionReason WhyExcluded(const std::string& share, const std::string& full_path) {
   struct stat status = {};
   const bool is_folder = lstat(full_path.c_str(), &status) == 0 && S_ISDIR(status.st_mode);
-  return services::Exclusions(root, std::move(rules)).Explain(full_path, is_folder);
+  return services::Exclusions(sdk::SDKShare(share).GetPath(), RulesOf(share)).Explain(full_path, is_folder);
 }
 
 std::string ExclusionText(const services::ExclusionReason& reason, const std::string& full_path) {

@@ -7,6 +7,10 @@
 
 namespace ferrox::cli {
 
+/// What the administrator has set for a share; of one that is not there yet, the patterns for all folders.
+/// @throws Failure when the settings cannot be told; Error.
+services::ExclusionRules RulesOf(const std::string& share);
+
 /// Which pattern keeps what is at `full_path`, in the folder of `share`, out of the index, or its content: as the index
 /// daemon decides it, by the patterns as they are now. Nothing need be there. For root and the owner alone: it reads
 /// the settings and ignore files. @throws Failure when the settings cannot be told; Error.

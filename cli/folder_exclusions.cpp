@@ -76,6 +76,12 @@ void ChangeWithPatterns(const Arguments& arguments, const std::vector<std::strin
   }
 }
 
+base::PatternLists PatternsAfter(const Arguments& arguments, const std::string& path) {
+  base::PatternLists lists = services::LoadFolderPatterns()[path];
+  Change(arguments, path, lists);
+  return lists;
+}
+
 std::string PatternText(const Json::Value& folder) {
   return Line("left out", folder["exclude"]) + Line("by name only", folder["exclude_content"]);
 }

@@ -6,6 +6,7 @@
 
 #include <json/forwards.h>
 
+#include "base/pattern_lists.h"
 #include "cli/command.h"
 
 /// The patterns of indexed folders, which are kept beside the list of folders (services/support/folder_patterns.h).
@@ -19,6 +20,9 @@ std::vector<Option> ExclusionOptions();
 /// no pattern; Failure when there would be too many; what `change` throws; Error.
 void ChangeWithPatterns(const Arguments& arguments, const std::vector<std::string>& paths,
                         const std::function<void()>& change);
+
+/// The patterns that the folder of this share path would then have. @throws as ChangeWithPatterns.
+base::PatternLists PatternsAfter(const Arguments& arguments, const std::string& path);
 
 /// Lines for people, indented, on what is left out of a folder; "" without patterns of its own.
 std::string PatternText(const Json::Value& folder);

@@ -13,6 +13,7 @@
 
 #include "base/files.h"
 #include "cli/escape.h"
+#include "cli/excluded.h"
 #include "cli/format.h"
 #include "cli/output.h"
 #include "cli/progress.h"
@@ -26,11 +27,10 @@ namespace {
 /// One walk. Folders wait in a list instead of on the stack, so that no depth of folders can exhaust it.
 class PreviewWalk {
  public:
-  PreviewWalk(std::string root, const Kinds& kinds, const std::map<std::string, std::string>& others)
-      : root_(std::move(root)), kinds_(kinds), others_(others) {}
+  explicit PreviewWalk(const PreviewRequest& request) : request_(request), exclusions_(request.root, request.rules) {}
 
-  Preview Run(const std::string& folder, const std::function<void(uint64_t files)>& progress) {
-    waiting_.push_back(folder);
+  Preview Run(const std::function<void(uint64_t files)>& progress) {
+    waiting_.push_back(request_.folder);
     while (!waiting_.empty()) {
       const std::string next = std::move(waiting_.back());
       waiting_.pop_back();
@@ -44,9 +44,9 @@ class PreviewWalk {
   /// The rules of places need a look at the disk and are asked for each folder once: for the top one with all above it,
   /// for those below it alone.
   std::string WhyNotEntered(const std::string& folder) {
-    const auto other = others_.find(folder);
-    if (other != others_.end()) return other->second;
-    const std::string above = entered_ == 0 ? root_ : folder.substr(0, folder.rfind('/'));
+    const auto other = request_.others.find(folder);
+    if (other != request_.others.end()) return other->second;
+    const std::string above = entered_ == 0 ? request_.root : folder.substr(0, folder.rfind('/'));
     return WhyFolderLeftOut(above, folder);
   }
 
@@ -57,31 +57,37 @@ class PreviewWalk {
     const base::OpenFolderPtr entries(fd < 0 ? nullptr : fdopendir(fd));
     if (entries == nullptr) return preview_.LeaveOut(folder, std::string("it cannot be read: ") + strerror(errno));
     if (entered_++ != 0) ++preview_.folders;
+    const services::Exclusions::FolderPtr excluded = exclusions_.In(folder);
     while (const dirent* entry = readdir(entries.get())) {
       const std::string name = entry->d_name;
-      if (name != "." && name != ".." && !fileindex::IsSystemPreservedFileName(name)) Take(fd, folder, name);
+      if (name == "." || name == ".." || fileindex::IsSystemPreservedFileName(name)) continue;
+      struct stat status = {};
+      if (fstatat(fd, name.c_str(), &status, AT_SYMLINK_NOFOLLOW) != 0) continue;  // gone in between
+      Take(status, (folder == "/" ? "" : folder) + "/" + name, excluded->Of(name, S_ISDIR(status.st_mode)));
     }
   }
 
-  void Take(int fd, const std::string& folder, const std::string& name) {
-    struct stat status = {};
-    if (fstatat(fd, name.c_str(), &status, AT_SYMLINK_NOFOLLOW) != 0) return;  // gone in between
-    const std::string path = (folder == "/" ? "" : folder) + "/" + name;
-    if (S_ISDIR(status.st_mode)) return waiting_.push_back(path);
+  void Take(const struct stat& status, const std::string& path, services::Exclusion exclusion) {
+    const bool is_out = exclusion == services::Exclusion::kLeftOut;
+    if (S_ISDIR(status.st_mode)) {
+      if (!is_out) return waiting_.push_back(path);
+      return preview_.LeaveOut(path, ExclusionText(exclusions_.Explain(path, true), path));
+    }
     if (S_ISLNK(status.st_mode)) {
       ++preview_.links;
       return;
     }
     const auto size = static_cast<uint64_t>(status.st_size);
+    if (is_out) return preview_.excluded.Add(size);
     const std::string kind = KindNameOf(path);
     preview_.all.Add(size);
     preview_.kinds[kind.empty() ? "other" : kind].Add(size);
-    if (kinds_.WantsContent(path)) preview_.content.Add(size);
+    const bool is_name_only = exclusion == services::Exclusion::kNameOnly;
+    if (!is_name_only && request_.kinds.WantsContent(path)) preview_.content.Add(size);
   }
 
-  const std::string root_;
-  const Kinds& kinds_;
-  const std::map<std::string, std::string>& others_;
+  const PreviewRequest& request_;
+  services::Exclusions exclusions_;
   std::vector<std::string> waiting_;
   uint64_t entered_ = 0;
   Preview preview_;
@@ -106,6 +112,7 @@ Json::Value PreviewJson(const std::string& name, const Preview& preview) {
   json["kinds"] = Json::Value(Json::objectValue);
   for (const auto& [kind, total] : preview.kinds) json["kinds"][kind] = TotalJson(total);
   json["links"] = Json::UInt64(preview.links);
+  json["excluded"] = TotalJson(preview.excluded);
   json["left_out"] = Json::Value(Json::arrayValue);
   for (const auto& [path, reason] : preview.left_out) {
     Json::Value& entry = json["left_out"].append(Json::Value());
@@ -126,10 +133,8 @@ void Preview::LeaveOut(const std::string& path, const std::string& reason) {
   }
 }
 
-Preview WalkForPreview(const std::string& root, const std::string& folder, const Kinds& kinds,
-                       const std::map<std::string, std::string>& others,
-                       const std::function<void(uint64_t files)>& progress) {
-  return PreviewWalk(root, kinds, others).Run(folder, progress);
+Preview WalkForPreview(const PreviewRequest& request, const std::function<void(uint64_t files)>& progress) {
+  return PreviewWalk(request).Run(progress);
 }
 
 void PrintPreview(const std::string& name, const Preview& preview, bool json) {
@@ -141,6 +146,7 @@ void PrintPreview(const std::string& name, const Preview& preview, bool json) {
     (void)printf("    %s: %s\n", kind.c_str(), TotalText(total).c_str());
   }
   if (preview.links != 0) (void)printf("    links, which are not indexed: %s\n", Count(preview.links).c_str());
+  if (preview.excluded.files != 0) (void)printf("    left out by patterns: %s\n", TotalText(preview.excluded).c_str());
   for (const auto& [path, reason] : preview.left_out) {
     (void)printf("    left out: %s: %s\n", EscapeForTerminal(path).c_str(), EscapeForTerminal(reason).c_str());
   }
@@ -153,11 +159,10 @@ bool IsDryRun(const Arguments& arguments) {
   return is_dry;
 }
 
-void ShowPreview(const std::string& name, const std::string& root, const std::string& folder, const Kinds& kinds,
-                 std::map<std::string, std::string> others, bool json) {
+void ShowPreview(PreviewRequest request, bool json) {
   constexpr std::chrono::milliseconds kBetween(100);
-  for (const SharePlace& inner : IndexedSharesBelow(folder)) {
-    others[inner.root] = "its files are those of share " + inner.share;
+  for (const SharePlace& inner : IndexedSharesBelow(request.folder)) {
+    request.others[inner.root] = "its files are those of share " + inner.share;
   }
   Progress progress(isatty(STDERR_FILENO) == 1);
   const auto begin = std::chrono::steady_clock::now();
@@ -175,9 +180,9 @@ void ShowPreview(const std::string& name, const std::string& root, const std::st
         Json::Int64(std::chrono::duration_cast<std::chrono::milliseconds>(now - begin).count());
     progress.Show(state);
   };
-  const Preview preview = WalkForPreview(root, folder, kinds, others, show);
+  const Preview preview = WalkForPreview(request, show);
   progress.Clear();
-  PrintPreview(name, preview, json);
+  PrintPreview(request.name, preview, json);
 }
 
 }  // namespace ferrox::cli

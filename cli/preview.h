@@ -11,6 +11,7 @@
 
 #include "cli/command.h"
 #include "cli/kinds.h"
+#include "services/support/exclusions.h"
 
 /// What the indexing of a folder would come to, for --dry-run: a walk by the rules of the index daemon that changes and
 /// opens nothing but folders.
@@ -32,6 +33,7 @@ struct Preview {
   FileTotal content;                       ///< of these, those whose content is read
   std::map<std::string, FileTotal> kinds;  ///< by kKinds and "other"
   uint64_t links = 0;                      ///< which are never indexed
+  FileTotal excluded;                      ///< by patterns; not in `all`
   /// Folders that are left out with all in them, and why; at most kLeftOutMax, further ones are counted.
   std::vector<std::pair<std::string, std::string>> left_out;
   uint64_t more_left_out = 0;
@@ -40,11 +42,18 @@ struct Preview {
   void LeaveOut(const std::string& path, const std::string& reason);
 };
 
-/// Walks `folder`, in a share whose folder is `root`. `others`: folders below it that are none of its concern, each
-/// with the reason. `progress` is called now and then with the number of files so far.
-Preview WalkForPreview(const std::string& root, const std::string& folder, const Kinds& kinds,
-                       const std::map<std::string, std::string>& others,
-                       const std::function<void(uint64_t files)>& progress);
+/// What to walk through.
+struct PreviewRequest {
+  std::string name;    ///< what the folder is called
+  std::string root;    ///< its share's folder
+  std::string folder;  ///< full path
+  Kinds kinds;         ///< of files whose content is read
+  services::ExclusionRules rules;
+  std::map<std::string, std::string> others;  ///< folders below it that are none of its concern, each with the reason
+};
+
+/// `progress` is called now and then with the number of files so far.
+Preview WalkForPreview(const PreviewRequest& request, const std::function<void(uint64_t files)>& progress);
 
 /// A preview for people, or as one JSON object in a line. `name` is what the folder is called.
 void PrintPreview(const std::string& name, const Preview& preview, bool json);
@@ -53,7 +62,6 @@ void PrintPreview(const std::string& name, const Preview& preview, bool json);
 bool IsDryRun(const Arguments& arguments);
 
 /// WalkForPreview and PrintPreview with a progress line on standard error: for 'folder add' and 'share add'.
-void ShowPreview(const std::string& name, const std::string& root, const std::string& folder, const Kinds& kinds,
-                 std::map<std::string, std::string> others, bool json);
+void ShowPreview(PreviewRequest request, bool json);
 
 }  // namespace ferrox::cli

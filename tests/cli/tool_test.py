@@ -444,7 +444,9 @@ class ToolTest(ToolCase):
 
     def test_dry_run_counts_and_changes_nothing(self):
         folder = f"{self.root}/vol/photo"
-        for name, size in (("a.txt", 3), ("tree/b.mp3", 4), ("tree/deep/c.jpg", 5), ("trip/d.txt", 6), ("tree/.DS_Store", 7)):
+        for name, size in (("a.txt", 3), ("tree/b.mp3", 4), ("tree/deep/c.jpg", 5), ("trip/d.txt", 6), ("tree/.DS_Store", 7),
+                           ("node_modules/e.js", 8), ("tree/f.log", 9)):
+            os.makedirs(os.path.dirname(f"{folder}/{name}"), exist_ok=True)
             with open(f"{folder}/{name}", "w", encoding="utf-8") as file:
                 file.write("x" * size)
         os.symlink("a.txt", f"{folder}/link")
@@ -453,15 +455,19 @@ class ToolTest(ToolCase):
             return sorted((place, names) for place, _, names in os.walk(self.root))
 
         before = files()
-        done = self.run_tool("folder", "add", "/photo", "--kinds", "document", "--dry-run", "--json")
+        done = self.run_tool("folder", "add", "/photo", "--kinds", "document", "--dry-run", "--json", "--exclude", "*.log")
         counted = json.loads(done.stdout)
         self.assertEqual((3, 12, 2, {"files": 1, "bytes": 3}, 1), (
             counted["files"], counted["bytes"], counted["folders"], counted["content"], counted["links"]), done.stderr)
         self.assertEqual({"document": {"files": 1, "bytes": 3}, "audio": {"files": 1, "bytes": 4},
                           "photo": {"files": 1, "bytes": 5}}, counted["kinds"])
-        self.assertEqual([{"path": f"{folder}/trip", "reason": "it is indexed already"}], counted["left_out"])
+        self.assertEqual({"files": 1, "bytes": 9}, counted["excluded"])
+        left_out = {entry["path"]: entry["reason"] for entry in counted["left_out"]}
+        self.assertEqual({f"{folder}/trip", f"{folder}/node_modules"}, set(left_out))
+        self.assertEqual("it is indexed already", left_out[f"{folder}/trip"])
+        self.assertIn('"node_modules/" (default)', left_out[f"{folder}/node_modules"])
         shown = self.run_tool("share", "add", f"{self.root}/vol/photo/tree", "--dry-run").stdout.decode()
-        self.assertTrue(shown.startswith(f"{folder}/tree: 2 files, 9 B, in 2 folders\n"), shown)
+        self.assertTrue(shown.startswith(f"{folder}/tree: 3 files, 18 B, in 2 folders\n"), shown)
         self.assertEqual(before, files())
         self.assertEqual(3, self.run_tool("folder", "add", "/photo/trip", "--dry-run").returncode)
 
