@@ -37,6 +37,7 @@ std::vector<const Command*> CommandsFor(const std::string& first) {
 /// Names of commands; `last_words`: of each only the last word.
 std::vector<std::string> Names(const std::vector<const Command*>& commands, bool last_words) {
   std::vector<std::string> names;
+  names.reserve(commands.size());
   for (const Command* command : commands) {
     names.push_back(last_words ? Split(command->name, ' ').back() : command->name);
   }
