@@ -10,12 +10,12 @@ namespace ferrox::engine {
 struct RankingConstants {
   // The text, by BM25: occurrences near a limit of 1 + k1 times the rarity, later in longer texts. `b` is how much the
   // length counts, from 0 to 1.
-  double k1 = 1.4;
-  double b = 0.75;
+  double k1 = 1.5;
+  double b = 0.7;
 
   // Places beside the text.
-  double in_name = 0.4;
-  double in_most_of_name = 1.0;  ///< more, times the cube of the share of the name that the words are
+  double in_name = 0.3;
+  double in_most_of_name = 0.8;  ///< more, times the cube of the share of the name that the words are
   double in_whole_name = 1.5;    ///< more, where they and it are the same
   double in_title = 3.0;
   double in_fields = 0.8;

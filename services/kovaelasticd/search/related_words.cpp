@@ -24,6 +24,7 @@ constexpr int64_t kNeverCommon = 50;
 void SoftWords::FindSynonyms(const std::vector<const QueryNode*>& nodes) {
   if (request_.synonyms == nullptr || request_.synonyms->IsEmpty()) return;
   std::vector<std::string> singles;
+  singles.reserve(nodes.size());
   for (const QueryNode* node : nodes) singles.push_back(SingleWord(*node));
   const std::vector<SynonymOfWord> synonyms = SynonymsIn(singles, *request_.synonyms);
   for (Word& word : words_) {
