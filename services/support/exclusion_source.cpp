@@ -10,6 +10,7 @@
 #include "base/open_beneath.h"
 #include "base/unique_fd.h"
 #include "common/file_util.h"
+#include "common/log.h"
 
 namespace ferrox::services {
 

@@ -39,9 +39,9 @@ inline Language LanguageOfNumber(int64_t number) {
 /// position, this mark and the stem. So a stem is one word, with a rarity of its own.
 inline constexpr char kStemMark = '\x04';
 
-/// Cuts words down to their stems, so that the forms of a word are one: "searching" and "searched". Works on folded words,
-/// since a user may leave accents out: what a language's rules need of them is put back first. Remembers words, most of
-/// which come again soon. For one thread at a time.
+/// Cuts words down to their stems, so that the forms of a word are one: "searching" and "searched". Works on folded
+/// words, since a user may leave accents out: what a language's rules need of them is put back first. Remembers words,
+/// most of which come again soon. For one thread at a time.
 class Stemmer {
  public:
   Stemmer();
