@@ -10,8 +10,7 @@ namespace ferrox::engine {
 
 namespace {
 
-/// More are a sign that a word is a common ending, and would take too long to
-/// look for.
+/// More are a sign that a word is a common ending, and would take too long to look for.
 constexpr size_t kCompoundsMax = 100;
 constexpr size_t kPartLeastBytes = 4;
 /// What joins two words, and the endings of a word's other forms.
@@ -46,8 +45,7 @@ std::vector<std::string_view> BeginningsOf(std::string_view word) {
   return beginnings;
 }
 
-/// Adds the words of the list that a part of a compound may be: itself, or a
-/// form of it.
+/// Adds the words of the list that a part of a compound may be: itself, or a form of it.
 void AddWords(const WordList& words, std::string_view part, std::vector<std::string>& found) {
   if (part.size() < kPartLeastBytes) return;
   std::string word(part);
@@ -58,8 +56,7 @@ void AddWords(const WordList& words, std::string_view part, std::vector<std::str
   }
 }
 
-/// What is left of a compound behind its first word, or before its last one, is
-/// another word and what joins them.
+/// What is left of a compound behind its first word, or before its last one, is another word and what joins them.
 std::vector<std::string> OtherWords(const WordList& words, std::string_view rest, bool is_behind) {
   std::vector<std::string> found;
   for (const std::string_view link : kLinks) {
