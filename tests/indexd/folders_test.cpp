@@ -167,7 +167,7 @@ TEST_F(FoldersTest, InnerShareThatIsRenamedIsNotReadMeanwhile) {
     while (!fs::exists(fileindex::DetachedQueuePath(queue_path))) usleep(1000);
     usleep(50000);  // in which a pass that does not wait reads
     const fileindex::FolderMgr folder_mgr;
-    for (const auto& configured : folder_mgr.GetFolders()) configured->SetShare(configured->GetShare() == "d" ? "n" : share);
+    for (const auto& entry : folder_mgr.GetFolders()) entry->SetShare(entry->GetShare() == "d" ? "n" : share);
     folder_mgr.Save();
   });
   try {
