@@ -13,8 +13,8 @@
 namespace ferrox::services {
 
 /// Where new connections of bound users wait until a thread of low priority has admitted them. However many of them
-/// come and are ended again, at the priority of the others that costs no more than their accepting. The user of whom the
-/// fewest wait is admitted first.
+/// come and are ended again, at the priority of the others that costs no more than their accepting. The user of whom
+/// the fewest wait is admitted first.
 class Reception {
  public:
   using Admit = std::function<void(std::unique_ptr<FrameConnection>)>;
