@@ -10,8 +10,8 @@ namespace ferrox::engine {
 struct RankingConstants {
   // The text, by BM25: occurrences near a limit of 1 + k1 times the rarity, later in longer texts. `b` is how much the
   // length counts, from 0 to 1.
-  double k1 = 1.5;
-  double b = 0.7;
+  double k1 = 1.7;
+  double b = 0.67;
 
   // Places beside the text.
   double in_name = 0.3;
