@@ -14,24 +14,13 @@ namespace {
 
 constexpr int64_t kDaysDefault = 365;
 
-Json::Value ToAnswer(const Token& token) {
-  Json::Value json;
-  json["id"] = token.id;
-  json["name"] = token.name;
-  json["user"] = Json::UInt(token.user);
-  json["scope"] = token.scope;
-  json["created"] = Json::Int64(token.created);
-  json["expires"] = Json::Int64(token.expires);
-  return json;
-}
-
 /// For who is answered at all, which the engine knows.
 Json::Value CreateToken(Tokens& tokens, const Call& call) {
   (void)AskEngineFor(call.who, "shares", Json::Value(Json::objectValue));
   const int64_t now = Clock::Get().Now();
   const int64_t days = call.body.get("days", Json::Int64(kDaysDefault)).asInt64();
   const Tokens::Made made = tokens.Create(call.who.uid, call.body["name"].asString(), now, now + days * kDaySec);
-  Json::Value answer = ToAnswer(made.token);
+  Json::Value answer = ToJson(made.token);
   answer["token"] = made.secret;
   return answer;
 }
@@ -39,7 +28,7 @@ Json::Value CreateToken(Tokens& tokens, const Call& call) {
 Json::Value ListTokens(const Tokens& tokens, const Call& call) {
   Json::Value answer;
   answer["tokens"] = Json::Value(Json::arrayValue);
-  for (const Token& token : tokens.Of(call.who.uid)) answer["tokens"].append(ToAnswer(token));
+  for (const Token& token : tokens.Of(call.who.uid)) answer["tokens"].append(ToJson(token));
   return answer;
 }
 

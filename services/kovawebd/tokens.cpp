@@ -22,6 +22,17 @@
 
 namespace ferrox::web {
 
+Json::Value ToJson(const Token& token) {
+  Json::Value json;
+  json["id"] = token.id;
+  json["name"] = token.name;
+  json["user"] = Json::UInt(token.user);
+  json["scope"] = token.scope;
+  json["created"] = Json::Int64(token.created);
+  json["expires"] = Json::Int64(token.expires);
+  return json;
+}
+
 namespace {
 
 constexpr size_t kTokensOfUserMax = 50, kTokensMax = 10000;
@@ -59,14 +70,8 @@ std::string HashOf(const std::string& secret) {
 }
 
 Json::Value ToFileEntry(const std::string& hash, const Token& token) {
-  Json::Value json;
+  Json::Value json = ToJson(token);
   json["sha256"] = hash;
-  json["id"] = token.id;
-  json["name"] = token.name;
-  json["user"] = Json::UInt(token.user);
-  json["scope"] = token.scope;
-  json["created"] = Json::Int64(token.created);
-  json["expires"] = Json::Int64(token.expires);
   return json;
 }
 

@@ -8,6 +8,8 @@
 #include <string>
 #include <vector>
 
+#include <json/forwards.h>
+
 #include "base/mutex.h"
 
 namespace ferrox::web {
@@ -20,6 +22,8 @@ struct Token {
   std::string scope;  ///< what it is good for; "search"
   int64_t created = 0, expires = 0;
 };
+/// What may be told of it: all members.
+Json::Value ToJson(const Token& token);
 
 /// The tokens of all users, in one file. Any thread may call any member; those that change something block until the
 /// disk has it.
