@@ -8,7 +8,7 @@ chmod 755 "$system"  # its "/", which all users enter
 trap 'rm -rf "$system"' EXIT
 
 libraries=libjsoncpp25,libsqlite3-0,libzstd1,libstemmer0d,libcld2-0,libuchardet0,libseccomp2,libmagic1,libzip4,libarchive13,libtag1v5-vanilla
-libraries+=,libgmime-3.0-0,libpoppler-cpp0v5,libexiv2-27,libmediainfo0v5
+libraries+=,libgmime-3.0-0,libpoppler-cpp0v5,libexiv2-27,libmediainfo0v5,libmicrohttpd12,libnettle8
 debootstrap --variant=minbase --include="systemd,systemd-sysv,$libraries" bookworm \
   "$system" >"$build/systemd-image.log"
 DESTDIR=$system cmake --install "$build" --prefix /usr >/dev/null
