@@ -8,6 +8,7 @@
 #include <utility>
 #include <vector>
 
+#include "services/kovaelasticd/search/visible_count.h"
 #include "services/kovaelasticd/search/word_forms.h"
 #include "services/kovaelasticd/store/fts.h"
 #include "services/kovaelasticd/store/word_list.h"
@@ -50,15 +51,6 @@ std::optional<DocSet> WithParts(StoreReader& reader, const Visible& visible, con
   return with;
 }
 
-bool HasVisible(StoreReader& reader, const Visible& visible, const std::string& word) {
-  HitCollector first(0, visible);
-  first.StopAfter(0);
-  const WordForm form = FormOfAny({word});
-  Collect(reader.database, "content_fts", form.content, false, first);
-  if (!first.HasStopped()) Collect(reader.database, "meta_fts", form.meta, false, first);
-  return first.HasStopped();
-}
-
 struct WordsLike {
   std::vector<std::string> words;  ///< the shortest first; at most kPatternWordsMax
   bool has_more = false;
@@ -88,7 +80,7 @@ WordsLike FindWordsLike(StoreReader& reader, const Visible& visible, const Patte
   });
   for (std::string& word : matching) {
     WorkLimit::Check();
-    if (visible.IsForAsker() && !HasVisible(reader, visible, word)) continue;
+    if (visible.IsForAsker() && !AnyVisible(reader.database, visible, FormOfAny({word}))) continue;
     like.has_more = like.words.size() == kPatternWordsMax;
     if (like.has_more) break;
     like.words.push_back(std::move(word));

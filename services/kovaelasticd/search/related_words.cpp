@@ -7,6 +7,7 @@
 #include "services/kovaelasticd/search/compound_words.h"
 #include "services/kovaelasticd/search/soft_words.h"
 #include "services/kovaelasticd/search/synonym_words.h"
+#include "services/kovaelasticd/search/visible_count.h"
 #include "services/kovaelasticd/store/word_list.h"
 #include "services/kovaelasticd/store/work_limit.h"
 
@@ -19,6 +20,7 @@ constexpr int64_t kCompoundedDocumentsMax = 50;
 constexpr size_t kCompoundsTakenMax = 24;
 /// So many documents may have another word that a word finds, too, however few there are in all.
 constexpr int64_t kNeverCommon = 50;
+
 }  // namespace
 
 void SoftWords::FindSynonyms(const std::vector<const QueryNode*>& nodes) {
@@ -65,13 +67,6 @@ void SoftWords::FindCompounds() {
   }
 }
 
-bool SoftWords::IsVisible(const std::string& word) {
-  TermCollector found(reader_.database, visible_, 0);
-  found.StopAfter(0);
-  found.Collect(FormsOf(word, constants_).front());
-  return found.HasStopped();
-}
-
 /// The list has words of other users' documents, too: what counts is that visible ones have the compound, mostly in
 /// such a language, and its other part.
 void SoftWords::TakeCompounds(Word& word, const WordList& known) {
@@ -86,7 +81,9 @@ void SoftWords::TakeCompounds(Word& word, const WordList& known) {
     found.Collect(forms);
     if (found.HasStopped() || found.Documents() == 0) continue;
     if (2 * CountCompounding(reader_.database, found.Set()) < found.Documents()) continue;
-    const auto is_visible = [this](const std::string& other) { return IsVisible(other); };
+    const auto is_visible = [this](const std::string& other) {
+      return AnyVisible(reader_.database, visible_, FormsOf(other, constants_).front());
+    };
     if (std::none_of(compound.others.begin(), compound.others.end(), is_visible)) continue;
     (void)TakeRelated(word, compound.word, forms, constants_.compound);
   }

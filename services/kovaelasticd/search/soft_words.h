@@ -87,7 +87,6 @@ class SoftWords {
   bool MayHaveCompounds();
   void FindCompounds();
   void TakeCompounds(Word& word, const WordList& known);
-  bool IsVisible(const std::string& word);
   void FindSynonyms(const std::vector<const QueryNode*>& nodes);
   bool TakeRelated(Word& word, const std::string& shown, const std::vector<WordForm>& forms, double share);
   void LookForRepairs();
